@@ -1,0 +1,114 @@
+#include "beat/beat_ctx.h"
+
+#include "dsp/mel.h"
+#include "platform/worker_group.h"
+
+pthread_mutex_t *feat_mutex_mt = nullptr;
+pthread_cond_t *feat_cond_mt = nullptr;
+
+namespace {
+
+constexpr double kFullScale = 32767.0;  // ana holds samples on the 16-bit scale
+
+// Frames of frame_size samples that fit, one per hop; the division truncates toward zero, so that a
+// signal a little shorter than a frame still counts as one. That frame is never read.
+int64_t count_frames(int64_t samples, int32_t frame_size, int32_t hop_size) {
+    if (frame_size < 1 || hop_size < 1) return 0;
+    return (samples - frame_size) / hop_size + 1;
+}
+
+float **alloc_rows(int32_t rows, int32_t columns) {
+    float **matrix = zeroed_items<float *>(rows);
+    if (matrix == nullptr) return nullptr;
+    for (int32_t i = 0; i < rows; ++i) matrix[i] = zeroed_items<float>(columns);
+    return matrix;
+}
+
+bool all_rows_present(float *const *matrix, int32_t rows) {
+    for (int32_t i = 0; i < rows; ++i) {
+        if (matrix[i] == nullptr) return false;
+    }
+    return true;
+}
+
+template <typename T>
+void release(T **items) {
+    free(*items);
+    *items = nullptr;
+}
+
+// Upper edge of the triangle below band k; single precision in every step.
+float band_edge(float top_mel, uint64_t k, uint32_t nbands) {
+    const float share = static_cast<float>(k) / static_cast<float>(uint64_t{nbands} + 1);
+    return Mel2Hz(top_mel * share + 0.0f);
+}
+
+}  // namespace
+
+void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float **matrix) {
+    const int32_t bins = nfft / 2;
+    const float bin_width = static_cast<float>(sr) / static_cast<float>(nfft);
+    const float top_mel = Hz2Mel(static_cast<float>(fmax));
+
+    for (uint32_t band = 0; band < nbands; ++band) {
+        const float lo = band_edge(top_mel, band, nbands);
+        const float centre = band_edge(top_mel, uint64_t{band} + 1, nbands);
+        const float hi = band_edge(top_mel, uint64_t{band} + 2, nbands);
+        for (int32_t bin = 0; bin < bins; ++bin) {
+            const float hz = bin_width * static_cast<float>(bin);
+            const float rising = (hz - lo) / (centre - lo);
+            const float falling = (hi - hz) / (hi - centre);
+            const float inside = falling < rising ? falling : rising;
+            const float height = inside > 0.0f ? inside : 0.0f;
+            matrix[bin][band] = height * 2.0f / (hi - lo);
+        }
+    }
+}
+
+void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
+    worker_lock_create(&feat_mutex_mt, &feat_cond_mt);
+
+    const int32_t frame_size = ctx->onset->frame_size;
+    const int32_t hop_size = ctx->onset->hop_size;
+    const int64_t n = analysis_length(ctx);
+    beat->band_count = kMelBands;
+    beat->hop_seconds = static_cast<double>(hop_size) / ctx->ana_rate;
+    beat->half_frame = frame_size > 0 ? frame_size / 2 : 0;
+    beat->frame_count = count_frames(n, frame_size, hop_size);
+
+    beat->frame_times = zeroed_items<float>(beat->frame_count);
+    beat->onset_env = zeroed_items<double>(beat->frame_count);
+    beat->mel_matrix = alloc_rows(beat->half_frame, kMelBands);
+    beat->signal = zeroed_items<double>(n);
+    beat->rise_flags = zeroed_items<int32_t>(n);
+    beat->threshold = zeroed_items<double>(beat->frame_count);
+    if (!beat_ctx_ready(beat)) return;
+
+    const float hop = static_cast<float>(beat->hop_seconds);
+    for (int64_t k = 0; k < beat->frame_count; ++k) {
+        beat->frame_times[k] = hop * static_cast<float>(k + 1);
+    }
+    for (int64_t i = 0; i < n; ++i) beat->signal[i] = ctx->ana[i] / kFullScale;
+    fft2melmtx(ctx->ana_rate, frame_size, ctx->ana_rate / 2, kMelBands, beat->mel_matrix);
+}
+
+bool beat_ctx_ready(const TAVO_BEAT_CTX *beat) {
+    return feat_mutex_mt != nullptr && feat_cond_mt != nullptr && beat->frame_times != nullptr &&
+           beat->onset_env != nullptr && beat->signal != nullptr && beat->rise_flags != nullptr &&
+           beat->threshold != nullptr && beat->mel_matrix != nullptr &&
+           all_rows_present(beat->mel_matrix, beat->half_frame);
+}
+
+void __tavo_deinit(TAVO_BEAT_CTX *beat) {
+    if (beat->mel_matrix != nullptr) {
+        for (int32_t i = 0; i < beat->half_frame; ++i) free(beat->mel_matrix[i]);
+    }
+    release(&beat->mel_matrix);
+    release(&beat->onset_env);
+    release(&beat->frame_times);
+    release(&beat->signal);
+    release(&beat->threshold);
+    release(&beat->rise_flags);
+    release(&beat->rise_frames);
+    worker_lock_release(&feat_mutex_mt, &feat_cond_mt);
+}

@@ -1,0 +1,112 @@
+// Stage 4, set-up: the working context of one beat analysis and the feature group's lock.
+//
+// In: TAVO_CTX with ana, ana_len, ana_rate and onset. Lives for one call of getBeatPosition.
+#ifndef TAVO_BEAT_BEAT_CTX_H
+#define TAVO_BEAT_BEAT_CTX_H
+
+#include <cstdint>
+#include <cstdlib>
+
+#include "core/tavo_ctx.h"
+#include "dsp/fft.h"
+
+constexpr int32_t kMelBands = 36;
+constexpr int32_t kBeatWorkers = 4;
+
+// F = frame_count, n = samples of the analysis signal, N = frame size.
+struct TAVO_BEAT_CTX {
+    double *onset_env;     // [F] spectral change per frame; the last entry stays 0
+    float **mel_matrix;    // [N / 2] rows, one per FFT bin, of [36] band weights
+    float *frame_times;    // [F] seconds, (k + 1) hops
+    double *signal;        // [n] ana / 32767
+    double *threshold;     // [F] copy of the threshold curve, its F - 1 values
+    int32_t *rise_frames;  // [rise_count] frames of the power rises, or null
+    int32_t rise_count;
+    int32_t *rise_flags;  // [n] 1 at the sample where a power rise starts
+    int32_t half_frame;   // N / 2
+    int64_t frame_count;  // F
+    double hop_seconds;   // hop / rate
+    int32_t band_count;   // 36
+};
+
+// One of the four threads of the onset envelope; it writes the rows of its own frames only.
+struct TAVO_ONSET_WORKER {
+    int32_t id;  // 0 to 3, also its slot in done_flags
+    pthread_t thread;
+    const double *signal;     // [n]
+    int64_t first;            // frame
+    int64_t last;             // frame, included
+    float **spectrum;         // [F] rows of [N / 2], shared
+    int32_t frame_size;       // N
+    int32_t hop_size;         // H
+    int64_t first_sample;     // first * H
+    const TAVO_FFT_CTX *fft;  // of size N, shared, read-only
+    int32_t *done_flags;      // [thread_count] shared
+    int32_t thread_count;     // 4
+    pthread_mutex_t *mutex;   // feat_mutex_mt
+    pthread_cond_t *cond;     // feat_cond_mt
+    int32_t band_count;       // 36
+    float **mel_matrix;       // shared, read-only
+    double **mel;             // [F] rows of [36] decibels, shared
+    const double *window;     // [N] shared, read-only
+};
+
+// One of the four threads of the threshold curve; it writes thr[first .. last] only.
+struct TAVO_THRES_WORKER {
+    int32_t id;  // 0 to 3, also its slot in done_flags
+    pthread_t thread;
+    double *thr;              // [F - 1] shared
+    const double *onset_env;  // [F] read-only
+    int64_t first;            // index
+    int64_t last;             // index, included
+    int32_t window;           // W, frames
+    int32_t percentile;       // 97
+    double running_max;       // largest threshold produced, 0 at start
+    int32_t *done_flags;      // [thread_count] shared
+    int32_t thread_count;     // 4
+    pthread_mutex_t *mutex;   // feat_mutex_mt
+    pthread_cond_t *cond;     // feat_cond_mt
+};
+
+static_assert(offsetof(TAVO_BEAT_CTX, rise_flags) == 56 &&
+              offsetof(TAVO_BEAT_CTX, band_count) == 88);
+static_assert(offsetof(TAVO_ONSET_WORKER, fft) == 64 && offsetof(TAVO_ONSET_WORKER, window) == 128);
+static_assert(offsetof(TAVO_THRES_WORKER, running_max) == 56);
+static_assert(offsetof(TAVO_THRES_WORKER, cond) == 88);
+
+extern "C" {
+
+// Serve both worker groups of this folder, from __beat_init to __tavo_deinit; else null.
+extern pthread_mutex_t *feat_mutex_mt;
+extern pthread_cond_t *feat_cond_mt;
+
+// Fills a zeroed context from the instance. When memory runs out it stays partly filled: see
+// beat_ctx_ready.
+void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
+
+// Releases what hangs from the context, and the lock and condition; not the record itself.
+void __tavo_deinit(TAVO_BEAT_CTX *beat);
+
+// Weights of nbands triangles of unit area, equally spaced on the mel scale from 0 to fmax Hz, for
+// the bins 0 .. nfft / 2 - 1: matrix[bin][band].
+void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float **matrix);
+}
+
+// Samples of the analysis signal, 0 when there is none.
+inline int64_t analysis_length(const TAVO_CTX *ctx) {
+    return ctx->ana != nullptr && ctx->ana_len > 0 ? ctx->ana_len : 0;
+}
+
+// True when __beat_init got all of its memory, the lock and the condition.
+bool beat_ctx_ready(const TAVO_BEAT_CTX *beat);
+
+// Zeroed room for count items, at least one; null when memory runs out or the size has no place in
+// size_t. Released with free.
+template <typename T>
+T *zeroed_items(int64_t count) {
+    const uint64_t items = count > 0 ? static_cast<uint64_t>(count) : 1;
+    if (items > SIZE_MAX / sizeof(T)) return nullptr;
+    return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
+}
+
+#endif

@@ -1,0 +1,20 @@
+// Stages 4 to 6: the beats and the tempo of the analysis signal.
+//
+// In: TAVO_CTX with ana, ana_len, ana_rate. Out: TAVO_ONSET_CTX bpm, beat_count, beat_times (ms
+// from the start of the signal). Before: pcm/resample.h. After: the callback.
+#ifndef TAVO_BEAT_BEATS_H
+#define TAVO_BEAT_BEATS_H
+
+#include "core/tavo_ctx.h"
+
+extern "C" {
+
+// Returns the number of beats. Sets state 3 when it ran to its end; a stop request, looked at
+// before the onset envelope and after the tempo, ends it with 0 beats and the state as it was.
+int32_t getBeatPosition(TAVO_CTX *ctx);
+
+// Releases the beats and the record itself; null does nothing.
+void clearOnsetCtx(TAVO_ONSET_CTX *onset);
+}
+
+#endif

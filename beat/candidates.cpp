@@ -1,0 +1,96 @@
+#include "beat/candidates.h"
+
+#include <algorithm>
+
+#include "beat/threshold.h"
+#include "dsp/peaks.h"
+
+namespace {
+
+constexpr double kMinute = 60.0;         // seconds: tempo to period
+constexpr int32_t kSlowBpm = 95;         // up to here beats lie at least kSlowSpan apart
+constexpr float kSlowSpan = 3.0f;        // seconds
+constexpr float kFastSpan = 1.0f;        // seconds
+constexpr int32_t kBeatPerFrame = 2583;  // BPM; a shorter period has no place in the envelope
+constexpr double kWindowBeats = 4.0;     // beat periods in the threshold's window
+constexpr float kMsPerSecond = 1000.0f;
+
+// How beats are placed at one tempo.
+struct placement {
+    float span;        // seconds: a whole number of periods, least distance of two beats
+    int32_t distance;  // the same in frames
+    int32_t window;    // frames in the threshold's window, even
+};
+
+placement place_for(int32_t bpm, float hop) {
+    const double period = kMinute / bpm;
+    const float least = bpm <= kSlowBpm ? kSlowSpan : kFastSpan;
+    placement place = {};
+    // float on purpose: the sum runs in single precision
+    while (place.span < least) place.span += static_cast<float>(period);
+    place.distance = static_cast<int32_t>(place.span / hop);
+
+    const auto seconds = static_cast<float>(static_cast<int32_t>(kWindowBeats * period));
+    place.window = static_cast<int32_t>(seconds / hop);
+    if (place.window % 2 != 0) ++place.window;
+    return place;
+}
+
+// Peaks that a rise asked for come first and need no threshold. Returns how many were accepted.
+int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const double *thr,
+                     int32_t max_beats, float *out) {
+    int32_t accepted = 0;
+    for (int32_t j = 0; j < peaks->count; ++j) {
+        const int32_t i = peaks->frames[j];
+        if (j >= beat->rise_count && !(beat->onset_env[i] > thr[i])) continue;
+        out[accepted++] = beat->frame_times[i + 1];
+        if (max_beats >= 1 && accepted == max_beats) break;
+    }
+    return accepted;
+}
+
+// thr: [F - 1] zero before; peaks: zero before.
+int32_t place_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *thr, PEAK_LIST *peaks,
+                    float *out) {
+    const int64_t count = beat->frame_count - 1;
+    const placement place = place_for(onset->bpm, beat->frame_times[0]);
+    if (build_threshold(beat, place.window, thr) != 0) return 0;
+    const int32_t found = findPeaksPriority(beat->onset_env, count, place.distance, peaks->frames,
+                                            beat->rise_frames, beat->rise_count);
+    peaks->count = found > 0 ? found : 0;
+    std::copy(thr, thr + count, beat->threshold);
+
+    // std::sort asks for no memory, and its order may call two values equal. qsort without memory
+    // turns to a method that runs out of bounds with comparators that never do.
+    const int32_t accepted = select_beats(beat, peaks, thr, onset->max_beats, out);
+    std::sort(peaks->frames, peaks->frames + peaks->count);
+    std::sort(out, out + accepted);
+    const int32_t total = accepted + fill_gaps(beat, peaks, place.span, out, accepted);
+    std::sort(out, out + total);
+    for (int32_t k = 0; k < total; ++k) out[k] *= kMsPerSecond;
+    return total;
+}
+
+// No two peaks are neighbours.
+int64_t peak_room(const TAVO_BEAT_CTX *beat) {
+    return (beat->frame_count > 0 ? beat->frame_count / 2 : 0) + beat->rise_count;
+}
+
+}  // namespace
+
+int64_t candidate_room(const TAVO_BEAT_CTX *beat) {
+    return peak_room(beat) + kMaxAddedBeats;
+}
+
+int32_t getBeatCandi_MT(TAVO_BEAT_CTX *beat, TAVO_ONSET_CTX *onset, float *out) {
+    if (beat->frame_count < 2 || onset->bpm < 1 || onset->bpm > kBeatPerFrame) return 0;
+    double *thr = zeroed_items<double>(beat->frame_count - 1);
+    PEAK_LIST peaks = {zeroed_items<int32_t>(peak_room(beat)), 0};
+    int32_t total = 0;
+    if (thr != nullptr && peaks.frames != nullptr) {
+        total = place_beats(beat, onset, thr, &peaks, out);
+    }
+    free(thr);
+    free(peaks.frames);
+    return total;
+}

@@ -1,0 +1,134 @@
+#include "beat/click_track.h"
+
+#include <cmath>
+
+#include "beat/beat_ctx.h"
+
+extern "C" {
+const char *fnamedec = "d:\\beattest\\__blips_0.wav";
+}
+
+namespace {
+
+constexpr size_t kHeaderBytes = 44;
+constexpr uint32_t kFileRate = 11025;  // Hz, whatever the analysis rate
+constexpr uint32_t kBytesPerSample = 2;
+constexpr double kTwoPi = 6.283185307179586;
+constexpr double kBlipHz = 4000.0;
+constexpr double kBlipScale = 160.0;  // brings the blip's top to about a quarter
+constexpr float kBlipSeconds = 0.1f;
+constexpr double kFullScale = 32767.0;
+constexpr double kBlipGain = 2.5;
+constexpr int32_t kChunk = 2048;  // samples written at once
+
+void put_u16(uint8_t *to, uint32_t value) {
+    to[0] = static_cast<uint8_t>(value & 0xFF);
+    to[1] = static_cast<uint8_t>(value >> 8 & 0xFF);
+}
+
+void put_u32(uint8_t *to, uint32_t value) {
+    put_u16(to, value & 0xFFFF);
+    put_u16(to + 2, value >> 16);
+}
+
+void put_tag(uint8_t *to, const char *tag) {
+    for (int32_t i = 0; i < 4; ++i) to[i] = static_cast<uint8_t>(tag[i]);
+}
+
+int32_t blip_length(int32_t sr) {
+    return sr > 0 ? static_cast<int32_t>(static_cast<float>(sr) * kBlipSeconds) : 0;
+}
+
+// A 4 kHz tone that swells for a tenth of the length and fades.
+void make_blip(int32_t sr, int32_t length, float *blip) {
+    const auto tau = static_cast<float>(length / 10);
+    for (int32_t i = 0; i < length; ++i) {
+        const float decay = -static_cast<float>(i) / tau;  // float on purpose
+        const double envelope = exp(static_cast<double>(decay)) * i;
+        blip[i] = static_cast<float>(envelope * cos(i * kTwoPi / sr * kBlipHz) / kBlipScale);
+    }
+}
+
+// The sample nearest to a beat, n for one behind the n samples.
+int64_t beat_sample(float beat, int32_t sr, int64_t n) {
+    const float samples = beat * static_cast<float>(sr) / 1000.0f;
+    const double nearest = static_cast<double>(samples) + 0.5;
+    return nearest < static_cast<double>(n) ? static_cast<int64_t>(nearest) : n;
+}
+
+// A blip that the end cuts short ends one sample before it, and its length stays for those to come.
+void lay_blips(const float *blip, int64_t length, const float *beats, int32_t count, int32_t sr,
+               int64_t n, float *track) {
+    for (int32_t b = 0; b < count; ++b) {
+        if (!(beats[b] >= 0.0f)) continue;
+        const int64_t start = beat_sample(beats[b], sr, n);
+        if (n - start < length) length = n - start > 0 ? n - start - 1 : 0;
+        for (int64_t i = 0; i < length; ++i) track[start + i] = blip[i];
+    }
+}
+
+// The low 16 bits of the mix of one sample.
+uint32_t mix_sample(double signal, float blip) {
+    const double mixed = (signal * kFullScale + blip * kBlipGain * kFullScale) * 0.5;
+    if (!(fabs(mixed) < INT32_MAX)) return 0;
+    return static_cast<uint32_t>(static_cast<int32_t>(mixed)) & 0xFFFF;
+}
+
+void write_samples(const double *signal, const float *track, int64_t n, FILE *stream) {
+    uint8_t bytes[kChunk * kBytesPerSample];
+    for (int64_t done = 0; done < n; done += kChunk) {
+        const int64_t count = n - done < kChunk ? n - done : kChunk;
+        for (int64_t i = 0; i < count; ++i) {
+            put_u16(bytes + i * kBytesPerSample, mix_sample(signal[done + i], track[done + i]));
+        }
+        fwrite(bytes, kBytesPerSample, static_cast<size_t>(count), stream);
+    }
+}
+
+}  // namespace
+
+int32_t makeWaveHeader(uint32_t n, FILE *stream) {
+    uint8_t header[kHeaderBytes];
+    put_tag(header, "RIFF");
+    put_u32(header + 4, kBytesPerSample * n + 36);
+    put_tag(header + 8, "WAVE");
+    put_tag(header + 12, "fmt ");
+    put_u32(header + 16, 16);  // bytes of the format chunk
+    put_u16(header + 20, 1);   // integer PCM
+    put_u16(header + 22, 1);   // channel
+    put_u32(header + 24, kFileRate);
+    put_u32(header + 28, kFileRate * kBytesPerSample);
+    put_u16(header + 32, kBytesPerSample);
+    put_u16(header + 34, 8 * kBytesPerSample);
+    put_tag(header + 36, "data");
+    put_u32(header + 40, kBytesPerSample * n);
+    return static_cast<int32_t>(fwrite(header, kHeaderBytes, 1, stream));
+}
+
+void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, float *track) {
+    const int32_t length = blip_length(sr);
+    float *blip = zeroed_items<float>(length);
+    if (blip == nullptr) return;
+    make_blip(sr, length, blip);
+    lay_blips(blip, length, beats, count, sr, n, track);
+    free(blip);
+}
+
+// The memory comes before the file, so that a file is never begun that cannot be finished, and the
+// blips after it, so that a host that wants no file does not pay for them.
+void write_click_track(const double *signal, int64_t n, int32_t sr, const TAVO_ONSET_CTX *onset) {
+    if (fnamedec == nullptr || fnamedec[0] == '\0') return;
+    const int32_t length = blip_length(sr);
+    float *blip = zeroed_items<float>(length);
+    float *track = zeroed_items<float>(n);
+    FILE *stream = blip != nullptr && track != nullptr ? fopen(fnamedec, "wb") : nullptr;
+    if (stream != nullptr) {
+        make_blip(sr, length, blip);
+        lay_blips(blip, length, onset->beat_times, onset->beat_count, sr, n, track);
+        makeWaveHeader(static_cast<uint32_t>(n), stream);
+        write_samples(signal, track, n, stream);
+        fclose(stream);
+    }
+    free(blip);
+    free(track);
+}

@@ -1,0 +1,23 @@
+// Diagnostic: the analysed signal with a blip at every beat, as a mono 16-bit WAV file.
+// The path is the public global fnamedec (core/tavo.h). Before: beat/beats.h.
+#ifndef TAVO_BEAT_CLICK_TRACK_H
+#define TAVO_BEAT_CLICK_TRACK_H
+
+#include <cstdint>
+#include <cstdio>
+
+#include "core/tavo_ctx.h"
+
+extern "C" {
+
+// Writes the 44-byte header of a file of n samples. Returns the items written, 1 or 0.
+int32_t makeWaveHeader(uint32_t n, FILE *stream);
+
+// Puts a 100 ms blip at each beat (ms, count of them) into track (n floats, zero before).
+void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, float *track);
+}
+
+// Renders and writes the click track of signal[n] (scaled to 1) when fnamedec can be created.
+void write_click_track(const double *signal, int64_t n, int32_t sr, const TAVO_ONSET_CTX *onset);
+
+#endif

@@ -1,0 +1,10 @@
+set(beat_sources
+  beat_ctx.cpp
+  onset_envelope.cpp
+  tempo.cpp
+  power_rise.cpp
+  threshold.cpp
+  candidates.cpp
+  gap_fill.cpp
+  beats.cpp
+  click_track.cpp)

@@ -1,0 +1,132 @@
+#include "beat/tempo.h"
+
+#include <cmath>
+
+namespace {
+
+constexpr double kExcerptEnd = 120.0;           // seconds from the start of the signal, at most
+constexpr double kMinute = 60.0;                // seconds: the excerpt, and the "per minute" of BPM
+constexpr double kSlowestBpm = 30.0;            // sets the largest lag
+constexpr double kPreferredBpm = 120.0;         // centre of the prior
+constexpr double kOctave = 0.6931471805599453;  // ln 2: the prior is one octave wide
+constexpr double kFasterWins = 0.53;  // share of the shorter period above which it is taken
+constexpr int32_t kFastestBpm = 200;  // an estimate above is not believed
+constexpr int32_t kDefaultBpm = 90;
+constexpr int32_t kNoMemory = -2;
+
+struct period_candidate {
+    double score;
+    int32_t lag;  // frames, 0 for none
+};
+
+// Scores of a period and its double. The first of equal maxima wins; a score must exceed 0.
+period_candidate best_of_two(const double *r, int32_t lags) {
+    period_candidate best = {0.0, 0};
+    for (int32_t k = 1; k < lags / 2; ++k) {
+        const double score = r[k] + 0.5 * r[2 * k] + 0.25 * (r[2 * k - 1] + r[2 * k + 1]);
+        if (score > best.score) best = {score, k};
+    }
+    return best;
+}
+
+// The same for a period and its triple.
+period_candidate best_of_three(const double *r, int32_t lags) {
+    period_candidate best = {0.0, 0};
+    for (int32_t k = 1; k < lags / 3; ++k) {
+        const double score = r[k] + 0.33 * (r[3 * k - 1] + r[3 * k] + r[3 * k + 1]);
+        if (score > best.score) best = {score, k};
+    }
+    return best;
+}
+
+// The beat period in frames, 0 when no candidate stands out.
+int32_t choose_period(const double *r, int32_t lags) {
+    const period_candidate two = lags < 4 ? period_candidate{0.0, 0} : best_of_two(r, lags);
+    const period_candidate three = lags < 6 ? period_candidate{0.0, 0} : best_of_three(r, lags);
+    const bool twofold = two.score > three.score;
+    const int32_t shorter = twofold ? two.lag : three.lag;
+    const int32_t longer = twofold ? 2 * shorter : 3 * shorter;
+    if (shorter == 0) return 0;
+    const double ratio = r[shorter] / (r[shorter] + r[longer]);
+    return ratio > kFasterWins ? shorter : longer;
+}
+
+// A preference for tempi near 120 BPM: a Gaussian in octaves. At lag 0 the tempo is infinite and
+// the weight 0.
+void weigh_lags(double *r, int32_t lags, double hop) {
+    const double frames_per_minute = kMinute / hop;
+    for (int32_t t = 0; t < lags; ++t) {
+        const double octaves = log((frames_per_minute / t) / kPreferredBpm) / kOctave;
+        r[t] = r[t] * exp(-0.5 * (octaves * octaves));
+    }
+}
+
+// Circular autocorrelation of the excerpt already in re[nfft]: re[t] for t < lags. Lags from nfft
+// on repeat, as those of a circular correlation do.
+int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32_t lags) {
+    if (tavo_dft(re, im, nfft, count, 1) != 0) return kNoMemory;
+    for (int64_t k = 0; k < nfft; ++k) re[k] = re[k] * re[k] + im[k] * im[k];
+
+    const int64_t distinct = lags < nfft ? lags : nfft;
+    if (tavo_inverse_dft(re, im, nfft, distinct, 1) != 0) return kNoMemory;
+    for (int64_t t = nfft; t < lags; ++t) re[t] = re[t - nfft];
+    return 0;
+}
+
+// The smallest power of two not below count.
+int64_t transform_size(int64_t count) {
+    int64_t size = 1;
+    while (size < count) size *= 2;
+    return size;
+}
+
+// The period as the excerpt x[count] gives it; 0 for none; -2 out of memory.
+// One value that is no number, as all are in silence, leaves no correlation that is: the sums of
+// the transforms, millions of terms then, are not worth taking.
+int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, double hop) {
+    for (int32_t i = 0; i < count; ++i) {
+        if (!std::isfinite(x[i])) return 0;
+    }
+    const int64_t room = nfft > lags ? nfft : lags;
+    double *re = zeroed_items<double>(room);
+    double *im = zeroed_items<double>(room);
+    int32_t period = kNoMemory;
+    if (re != nullptr && im != nullptr) {
+        for (int32_t i = 0; i < count; ++i) re[i] = x[i];
+        if (autocorrelate(re, im, nfft, count, lags) == 0) {
+            weigh_lags(re, lags, hop);
+            period = choose_period(re, lags);
+        }
+    }
+    free(re);
+    free(im);
+    return period;
+}
+
+}  // namespace
+
+int32_t calc_bpm_acf(const double *x, int64_t nfft, int32_t D, int32_t L, double hop) {
+    if (nfft < 1) return kNoPeriodBpm;
+    const int32_t count = L < nfft ? L : static_cast<int32_t>(nfft);
+    const int32_t period = find_period(x, nfft, D, count, hop);
+    if (period < 0) return kNoMemory;
+    if (period == 0) return kNoPeriodBpm;  // 60 / 0 has no place in an integer
+    const double bpm = kMinute / (period * hop);
+    return bpm < kNoPeriodBpm ? static_cast<int32_t>(bpm) : kNoPeriodBpm;
+}
+
+int32_t estimate_tempo(const TAVO_BEAT_CTX *beat) {
+    if (beat->frame_count < 2) return kDefaultBpm;
+    const double hop = beat->hop_seconds;
+    const double latest = kExcerptEnd / hop;
+    const auto frames = static_cast<double>(beat->frame_count);
+    const auto end = static_cast<int64_t>(latest < frames ? latest : frames);
+    const double earliest = static_cast<double>(end) - kMinute / hop;
+    const auto start = static_cast<int64_t>(earliest > 0.0 ? earliest : 0.0);
+    const auto length = static_cast<int32_t>(end - start);
+    const auto lags = static_cast<int32_t>((kMinute / hop) / kSlowestBpm);
+
+    const int32_t bpm =
+        calc_bpm_acf(beat->onset_env + start, transform_size(length), lags, length, hop);
+    return bpm > kFastestBpm ? kDefaultBpm : bpm;
+}

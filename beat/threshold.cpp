@@ -1,0 +1,188 @@
+#include "beat/threshold.h"
+
+#include "dsp/peaks.h"
+#include "platform/worker_group.h"
+
+namespace {
+
+constexpr int32_t kPercentile = 97;
+constexpr int32_t kNoMemory = -2;
+
+int32_t percentile_index(int32_t count, int32_t percentile) {
+    return static_cast<int32_t>(int64_t{count} * percentile / 100);
+}
+
+// Moves the value at pos to its place among its otherwise ascending neighbours. Values that compare
+// to nothing, as those of a silent song, stay where they are.
+void move_up(double *sorted, int32_t pos, int32_t count) {
+    const double value = sorted[pos];
+    for (; pos + 1 < count && sorted[pos + 1] < value; ++pos) sorted[pos] = sorted[pos + 1];
+    sorted[pos] = value;
+}
+
+void move_down(double *sorted, int32_t pos) {
+    const double value = sorted[pos];
+    for (; pos > 0 && sorted[pos - 1] > value; --pos) sorted[pos] = sorted[pos - 1];
+    sorted[pos] = value;
+}
+
+void sort_ascending(double *values, int32_t count) {
+    for (int32_t i = 1; i < count; ++i) move_down(values, i);
+}
+
+// The percentile of env[0 .. count - 1]; scratch has room for count.
+double percentile_of(const double *env, int32_t count, double *scratch) {
+    for (int32_t i = 0; i < count; ++i) scratch[i] = env[i];
+    sort_ascending(scratch, count);
+    return scratch[percentile_index(count, kPercentile)];
+}
+
+// Slides the sorted window over the worker's range: at index i it holds the W values from half a
+// window before i on. Each step replaces the value that leaves and moves the new one to its place.
+void slide_window(TAVO_THRES_WORKER *worker, double *win) {
+    const int32_t size = worker->window;
+    const int32_t half = size / 2;
+    const int32_t rank = percentile_index(size, worker->percentile);
+    const double *env = worker->onset_env;
+    for (int32_t k = 0; k < size; ++k) win[k] = env[worker->first - half + k];
+    sort_ascending(win, size);
+
+    for (int64_t i = worker->first; i <= worker->last; ++i) {
+        if (i > worker->first) {
+            const int32_t pos = findIndex(win, size, env[i - 1 - half]);
+            const double old = win[pos];
+            win[pos] = env[i - half + size - 1];
+            if (old < win[pos]) {
+                move_up(win, pos, size);
+            } else {
+                move_down(win, pos);
+            }
+        }
+        worker->thr[i] = win[rank];
+        if (worker->thr[i] > worker->running_max) worker->running_max = worker->thr[i];
+    }
+}
+
+// The work of one worker. One that gets no memory clears its thr pointer, which its starter looks
+// at after the join.
+void run_thres_worker(void *record) {
+    auto *worker = static_cast<TAVO_THRES_WORKER *>(record);
+    if (worker->first > worker->last || worker->window < 1) return;
+    double *win = zeroed_items<double>(worker->window);
+    if (win == nullptr) {
+        worker->thr = nullptr;
+        return;
+    }
+    slide_window(worker, win);
+    free(win);
+}
+
+// Four equal ranges over the places whose window fits. Neighbours share their boundary place; only
+// the earlier worker is given it, so that no place is written by two threads.
+void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
+                  TAVO_THRES_WORKER *workers, int32_t *done) {
+    const int64_t count = beat->frame_count - 1;
+    const int64_t half = window / 2;
+    const int64_t share = (count - window) / kBeatWorkers;
+    for (int32_t id = 0; id < kBeatWorkers; ++id) {
+        TAVO_THRES_WORKER *worker = &workers[id];
+        const bool is_last = id == kBeatWorkers - 1;
+        worker->id = id;
+        worker->thr = thr;
+        worker->onset_env = beat->onset_env;
+        worker->first = id * share + half + (id == 0 ? 0 : 1);
+        worker->last = is_last ? count - half : (id + 1) * share + half;
+        worker->window = window;
+        worker->percentile = kPercentile;
+        worker->done_flags = done;
+        worker->thread_count = kBeatWorkers;
+        worker->mutex = feat_mutex_mt;
+        worker->cond = feat_cond_mt;
+    }
+}
+
+// Fills the middle of thr and sets *top to the largest value there, at least 0.
+int32_t run_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr, double *top) {
+    TAVO_THRES_WORKER workers[kBeatWorkers] = {};
+    int32_t done[kBeatWorkers] = {};
+    worker_slot slots[kBeatWorkers];
+    fill_workers(beat, window, thr, workers, done);
+    for (int32_t id = 0; id < kBeatWorkers; ++id) {
+        slots[id] = {&workers[id], &workers[id].thread, _tavo_proc_beatcandi, run_thres_worker};
+    }
+    worker_group_run(slots, kBeatWorkers, feat_mutex_mt, feat_cond_mt, done);
+
+    for (const TAVO_THRES_WORKER &worker : workers) {
+        if (worker.thr == nullptr) return kNoMemory;
+        if (worker.running_max > *top) *top = worker.running_max;
+    }
+    return 0;
+}
+
+// From the last full window on, a straight line towards top.
+void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
+    const int64_t fitting = count - window / 2;
+    const int64_t start = fitting > 1 ? fitting : 1;
+    const double slope = (top - thr[start - 1]) / (window * 0.5);
+    for (int64_t i = start; i < count; ++i) {
+        thr[i] = top - slope * static_cast<double>(count - i);
+    }
+}
+
+// Before the first full window, the percentile of the second around each place; the first half
+// second stays 0. Near the end of a short signal the second is cut to the values that exist.
+void fill_head(const TAVO_BEAT_CTX *beat, int32_t window, int32_t second, double *thr,
+               double *scratch) {
+    const int64_t count = beat->frame_count - 1;
+    const int64_t end = window / 2 < count ? window / 2 : count;
+    for (int64_t i = second / 2; i < end; ++i) {
+        const int64_t start = i - second / 2;
+        const int64_t rest = beat->frame_count - start;
+        const int32_t size = rest < second ? static_cast<int32_t>(rest) : second;
+        thr[i] = percentile_of(beat->onset_env + start, size, scratch);
+    }
+}
+
+}  // namespace
+
+void _thd_thres_cleanup(void *record) {
+    const auto *worker = static_cast<const TAVO_THRES_WORKER *>(record);
+    worker_group_done(worker->mutex, worker->cond, worker->done_flags, worker->thread_count,
+                      worker->id);
+}
+
+void *_tavo_proc_beatcandi(void *record) {
+    pthread_cleanup_push(_thd_thres_cleanup, record);
+    run_thres_worker(record);
+    pthread_exit(nullptr);
+    pthread_cleanup_pop(0);
+    return nullptr;
+}
+
+int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, double *thr) {
+    const int64_t frames = beat->frame_count;
+    const int64_t half = window / 2;
+    if (frames < 2 || window < 2) return 0;
+    if (feat_mutex_mt == nullptr || feat_cond_mt == nullptr) return kNoMemory;
+    const auto second = static_cast<int32_t>(1.0f / beat->frame_times[0]);
+    double *scratch = zeroed_items<double>(window > second ? window : second);
+    if (scratch == nullptr) return kNoMemory;
+
+    // One or two values short of a full window, the single place in the middle has what there is.
+    // frames counts the envelope's last entry, which is always 0.
+    double top = 0.0;
+    int32_t code = 0;
+    const bool has_place = frames >= window - 2 && half < frames - 1;
+    if (has_place && frames < window) {
+        thr[half] = percentile_of(beat->onset_env, static_cast<int32_t>(frames), scratch);
+        if (thr[half] > top) top = thr[half];
+    } else if (has_place) {
+        code = run_workers(beat, window, thr, &top);
+    }
+    if (code == 0) {
+        ramp_tail(thr, frames - 1, window, top);
+        fill_head(beat, window, second, thr, scratch);
+    }
+    free(scratch);
+    return code;
+}

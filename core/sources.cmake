@@ -1,0 +1,4 @@
+set(core_sources
+  instance.cpp
+  lifecycle.cpp
+  jobs.cpp)

@@ -1,0 +1,207 @@
+#include "dsp/peaks.h"
+
+#include <cstdlib>
+#include <cstring>
+
+#include "dsp/sort.h"
+
+namespace {
+
+// Marks of the input's positions while peaks are suppressed.
+constexpr uint8_t kSuppressed = 1;
+constexpr uint8_t kPriority = 2;
+
+constexpr int64_t kMaxIndexed = INT32_MAX;  // positions that every index list can name
+constexpr int64_t kFar = INT64_MAX / 2;     // farther than any reach
+
+template <typename Sample>
+bool is_peak(const Sample *x, int64_t i) {
+    return x[i] > x[i - 1] && x[i] > x[i + 1];
+}
+
+template <typename Sample>
+int64_t count_peaks(const Sample *x, int64_t len) {
+    int64_t count = 0;
+    for (int64_t i = 1; i + 1 < len; i++) count += is_peak(x, i) ? 1 : 0;
+    return count;
+}
+
+// The count peaks of x[len] in ascending order, to be freed; null when memory runs out.
+template <typename Record, typename Sample>
+Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
+    Record *peaks = static_cast<Record *>(calloc(static_cast<size_t>(count), sizeof(Record)));
+    if (peaks == nullptr) return nullptr;
+    int64_t k = 0;
+    for (int64_t i = 1; i + 1 < len; i++) {
+        if (!is_peak(x, i)) continue;
+        peaks[k].value = x[i];
+        peaks[k].index = static_cast<decltype(peaks[k].index)>(i);
+        k++;
+    }
+    return peaks;
+}
+
+// Suppresses the positions at most reach away from index. Marking a peak that ranks before the one
+// at index changes nothing: had it survived, it would have suppressed that one, since the range is
+// symmetric. Survivors lie more than reach apart, so all calls together mark each position at most
+// three times.
+void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t reach) {
+    if (reach < 0) return;
+    const int64_t begin = index > reach ? index - reach : 0;
+    const int64_t end = len - 1 - index > reach ? index + reach : len - 1;
+    memset(marks + begin, kSuppressed, static_cast<size_t>(end - begin + 1));
+}
+
+// Walks the peaks, largest first, and writes those that survive, at most limit. Returns how many.
+template <typename Record, typename Index>
+int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int64_t len,
+                        int64_t reach, int64_t limit, Index *out) {
+    int32_t written = 0;
+    for (int64_t k = 0; k < count && written < limit; k++) {
+        const int64_t index = peaks[k].index;
+        if ((marks[index] & kSuppressed) != 0) continue;
+        out[written++] = peaks[k].index;
+        suppress_around(marks, len, index, reach);
+    }
+    return written;
+}
+
+// Suppresses everything at most reach away from a position marked as priority, in two sweeps.
+void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t reach) {
+    int64_t distance = kFar;  // to the last priority position seen
+    for (int64_t i = 0; i < len; i++) {
+        distance = (marks[i] & kPriority) != 0 ? 0 : distance + 1;
+        if (distance <= reach) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
+    }
+    distance = kFar;
+    for (int64_t i = len - 1; i >= 0; i--) {
+        distance = (marks[i] & kPriority) != 0 ? 0 : distance + 1;
+        if (distance <= reach) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
+    }
+}
+
+// What findNearestIndex answers for strictly ascending positions and a target from 0 on, by halving
+// instead of its walk: a long song has thousands of targets among hundreds of thousands of peaks.
+int32_t nearest_by_halving(const int32_t *list, int32_t target, int32_t n) {
+    int32_t begin = 0;  // all before it lie below target, none from end on does
+    int32_t end = n;
+    while (begin < end) {
+        const int32_t middle = begin + (end - begin) / 2;
+        if (list[middle] < target) {
+            begin = middle + 1;
+        } else {
+            end = middle;
+        }
+    }
+    if (begin == 0) return 0;
+    if (begin == n) return n - 1;
+    return list[begin] - target >= target - list[begin - 1] ? begin - 1 : begin;
+}
+
+// Writes the peaks nearest to the priority positions and marks them. Returns how many; -1 when
+// memory runs out.
+int32_t take_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *priority,
+                        int32_t n_priority, uint8_t *marks, int32_t *out) {
+    if (count < 2 || n_priority < 1) return 0;
+    int32_t *list = static_cast<int32_t *>(malloc(static_cast<size_t>(count) * sizeof(int32_t)));
+    if (list == nullptr) return -1;
+    for (int32_t k = 0; k < count; k++) list[k] = peaks[k].index;
+    int32_t taken = 0;
+    for (int32_t k = 0; k < n_priority; k++) {
+        // Below 0 the walk's distances may wrap, which halving does not follow.
+        const int32_t nearest = priority[k] < 0 ? findNearestIndex(list, priority[k], count)
+                                                : nearest_by_halving(list, priority[k], count);
+        if (nearest == count - 1) continue;
+        marks[list[nearest]] = kPriority;
+        out[taken++] = list[nearest];
+    }
+    free(list);
+    return taken;
+}
+
+int32_t wrapping_distance(int32_t a, int32_t b) {
+    const uint32_t difference = static_cast<uint32_t>(a) - static_cast<uint32_t>(b);
+    const bool negative = static_cast<int32_t>(difference) < 0;
+    return static_cast<int32_t>(negative ? 0u - difference : difference);
+}
+
+}  // namespace
+
+int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_t max_count,
+                         uint32_t *out) {
+    if (len > kMaxIndexed) len = kMaxIndexed;
+    const int64_t count = count_peaks(x, len);
+    if (count == 0) return 0;
+    PEAK_INFO_F *peaks = collect_peaks<PEAK_INFO_F>(x, len, count);
+    uint8_t *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    int32_t written = 0;
+    if (peaks != nullptr && marks != nullptr) {
+        qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO_F), compare_peak_f);
+        const int64_t limit = max_count == 0 ? count : static_cast<int64_t>(max_count);
+        // Bounds included: at 0 the range holds the peak alone, and nothing is suppressed.
+        written = write_survivors(peaks, count, marks, len, min_dist, limit, out);
+    }
+    free(marks);
+    free(peaks);
+    return written;
+}
+
+int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out) {
+    if (len > kMaxIndexed) len = kMaxIndexed;
+    const int64_t count = count_peaks(x, len);
+    if (count == 0) return 0;
+    PEAK_INFO *peaks = collect_peaks<PEAK_INFO>(x, len, count);
+    uint8_t *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    int32_t written = 0;
+    if (peaks != nullptr && marks != nullptr) {
+        if (min_dist != 0) {
+            qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO), compare_peak);
+        }
+        // Bounds excluded: a peak min_dist away survives.
+        const int64_t reach = static_cast<int64_t>(min_dist) - 1;
+        written = write_survivors(peaks, count, marks, len, reach, count, out);
+    }
+    free(marks);
+    free(peaks);
+    return written;
+}
+
+int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_t *out,
+                          const int32_t *priority, int32_t n_priority) {
+    if (min_dist == 0) return -1;
+    if (len > kMaxIndexed) len = kMaxIndexed;
+    const int64_t count = count_peaks(x, len);
+    if (count == 0) return 0;
+    PEAK_INFO *peaks = collect_peaks<PEAK_INFO>(x, len, count);
+    uint8_t *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    int32_t taken = -1;
+    if (peaks != nullptr && marks != nullptr) {
+        taken =
+            take_priorities(peaks, static_cast<int32_t>(count), priority, n_priority, marks, out);
+    }
+    int32_t written = 0;
+    if (taken >= 0) {
+        const int64_t reach = static_cast<int64_t>(min_dist) - 1;
+        suppress_around_priorities(marks, len, reach);
+        qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO), compare_peak);
+        written = taken + write_survivors(peaks, count, marks, len, reach, count, out + taken);
+    }
+    free(marks);
+    free(peaks);
+    return written;
+}
+
+int32_t findNearestIndex(const int32_t *list, int32_t target, int32_t n) {
+    if (n < 2) return 0;
+    for (int32_t k = 0; k + 1 < n; k++) {
+        if (wrapping_distance(list[k + 1], target) >= wrapping_distance(list[k], target)) return k;
+    }
+    return n - 1;
+}
+
+int32_t findIndex(const double *x, int32_t n, double value) {
+    for (int32_t k = 0; k < n; k++) {
+        if (x[k] == value) return k;
+    }
+    return 0;
+}

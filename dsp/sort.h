@@ -1,0 +1,25 @@
+// Comparators for qsort, none of which reports equality, and an in-place quicksort of doubles.
+#ifndef TAVO_DSP_SORT_H
+#define TAVO_DSP_SORT_H
+
+#include <cstdint>
+
+extern "C" {
+
+int compare_peak_f(const void *a, const void *b);  // PEAK_INFO_F, descending by value
+int compare_peak(const void *a, const void *b);    // PEAK_INFO, descending by value
+int compare_value(const void *a, const void *b);   // double, ascending
+int compare_fvalue(const void *a, const void *b);  // float, ascending
+int compare_ivalue(const void *a, const void *b);  // int32_t, ascending
+
+// Sorts a[lo .. hi], both included, ascending.
+void quickSort(int32_t lo, int32_t hi, double *a);
+
+// Puts a[lo] at its sorted place among a[lo .. hi] and returns that place.
+int32_t partition(int32_t lo, int32_t hi, double *a);
+
+// Exchanges two 8-byte values.
+void swap(void *a, void *b);
+}
+
+#endif

@@ -1,0 +1,19 @@
+// Stage 7: the highlight start of a decoded song.
+//
+// In: TAVO_CTX with pcm, pcm_bytes, fmt, duration. Out: hl.hl_pos, milliseconds.
+// Before: pcm/decode.h. After: the callback, or pcm/from_highlight.h in mode 2.
+#ifndef TAVO_HIGHLIGHT_POSITION_H
+#define TAVO_HIGHLIGHT_POSITION_H
+
+#include "core/tavo_ctx.h"
+
+extern "C" {
+
+// Returns the start in milliseconds and stores it in hl.hl_pos; 0 below 6 s of PCM.
+uint32_t getHLPosition(TAVO_CTX *ctx);
+
+// Releases the envelope and the context itself; null does nothing.
+void clearHighlgihtCtx(TAVO_HL_CTX *hl);
+}
+
+#endif

@@ -1,0 +1,86 @@
+#include "highlight/power_envelope.h"
+
+#include <cmath>
+#include <cstdlib>
+
+namespace {
+
+constexpr int64_t kWindowSeconds = 6;
+constexpr int64_t kHopSeconds = 2;
+constexpr int kSections = 2;  // parts of the song summed side by side
+constexpr int kOverlap = 3;   // windows that hold each sample
+
+typedef double PAIR __attribute__((vector_size(16)));  // one value per section
+
+float power_of_sum(double sum, int64_t window) {
+    const float mean = static_cast<float>(sum / static_cast<double>(window));
+    return 10.0f * log10f(mean + 1.0f);
+}
+
+// Adds hop samples of both sections to the three sums that run over them. Every sum takes its
+// samples in their own order, so it has the bits of a window summed alone.
+void add_hop(PAIR sums[kOverlap], const int16_t *first, const int16_t *second, int64_t hop) {
+    PAIR oldest = sums[0];
+    PAIR middle = sums[1];
+    PAIR newest = sums[2];
+    for (int64_t i = 0; i < hop; i++) {
+        const PAIR x = {static_cast<double>(first[i]), static_cast<double>(second[i])};
+        const PAIR level = x * kInverseHead + x * kInverseTail;
+        const PAIR square = level * level;
+        oldest += square;
+        middle += square;
+        newest += square;
+    }
+    sums[0] = oldest;
+    sums[1] = middle;
+    sums[2] = newest;
+}
+
+}  // namespace
+
+float window_power(const int16_t *pcm, int64_t window) {
+    double sum = 0.0;
+    for (int64_t i = 0; i < window; i++) {
+        const double x = static_cast<double>(pcm[i]);
+        const double level = x * kInverseHead + x * kInverseTail;
+        sum += level * level;
+    }
+    return power_of_sum(sum, window);
+}
+
+void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *out) {
+    if (count < 1) return;
+    // With an odd count the sections share a window, which both give the same value.
+    const int64_t length = (count + kSections - 1) / kSections;
+    const int64_t second = count - length;
+    PAIR sums[kOverlap] = {};
+    for (int64_t k = 0; k < length + kOverlap - 1; k++) {
+        const int16_t *samples = pcm + k * hop;
+        add_hop(sums, samples, samples + second * hop, hop);
+        const int64_t done = k - (kOverlap - 1);  // the window that ends with this hop
+        if (done >= 0) {
+            out[done] = power_of_sum(sums[0][0], kOverlap * hop);
+            out[second + done] = power_of_sum(sums[0][1], kOverlap * hop);
+        }
+        sums[0] = sums[1];
+        sums[1] = sums[2];
+        sums[2] = PAIR{0.0, 0.0};
+    }
+}
+
+int32_t _calc_power_level(const int16_t *pcm, int64_t sample_count, int32_t rate, TAVO_HL_CTX *hl) {
+    hl->power_count = 0;
+    if (rate <= 0) return 0;
+    const int64_t last = sample_count - kWindowSeconds * rate;  // the last possible window start
+    if (last < 0) return 0;
+    const int64_t hop = kHopSeconds * rate;
+    const int64_t count = last / hop + 1;
+    if (count > INT32_MAX) return 0;
+    float *power = static_cast<float *>(malloc(static_cast<size_t>(count) * sizeof(float)));
+    if (power == nullptr) return 0;
+    static_assert(kWindowSeconds == kOverlap * kHopSeconds);
+    overlapping_powers(pcm, hop, count, power);
+    hl->power = power;
+    hl->power_count = static_cast<int32_t>(count);
+    return hl->power_count;
+}

@@ -1,0 +1,143 @@
+#include "highlight/region.h"
+
+namespace {
+
+constexpr int32_t kMaxToValley = 25;  // points, 50 s: a valley farther off is not the region's end
+constexpr int32_t kScanBegin = 7;     // points after chosen, 14 s
+constexpr int32_t kScanEnd = 24;      // 48 s, included
+constexpr int64_t kMinReach = 3;      // points before chosen worth moving the start for
+constexpr int64_t kNearIdeal = 2;     // a valley this close to the ideal start is taken at once
+
+struct SONG {
+    const float *norm;
+    int32_t n;
+    int32_t nv;
+    const int32_t *valleys;
+    const int32_t *pairs;
+    int32_t nseg;
+    float mean;
+    float std;
+};
+
+// A list entry near the ideal start.
+struct CANDIDATE {
+    bool present;
+    bool ran_out;  // the distance still fell at the list's last entry
+    int32_t pos;
+    int64_t distance;  // from the ideal start
+};
+
+int64_t distance(int64_t a, int64_t b) {
+    return a < b ? b - a : a - b;
+}
+
+// Walks list from index first in steps of step, up to and with index last, while the entries come
+// strictly nearer to ideal.
+CANDIDATE walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_t last,
+                       int32_t step) {
+    int32_t k = first;
+    int64_t nearest = distance(list[k], ideal);
+    while (k != last && distance(list[k + step], ideal) < nearest) {
+        k += step;
+        nearest = distance(list[k], ideal);
+    }
+    return {true, k == last, list[k], nearest};
+}
+
+// Index of the last valley not after chosen; -1 when there is none.
+int32_t valley_before(const SONG *song, int32_t chosen) {
+    int32_t k = 0;
+    while (k < song->nv && song->valleys[k] <= chosen) k++;
+    return k - 1;
+}
+
+// The loudness has fallen below last and stays below the mean. Beyond the song's end nothing is
+// known to be below it.
+bool is_drop(const SONG *song, int32_t idx, float last) {
+    if (!(song->norm[idx] < last) || idx + 3 >= song->n) return false;
+    return (song->norm[idx + 2] + song->norm[idx + 3]) * 0.5f < song->mean;
+}
+
+int32_t segment_end(const SONG *song, int32_t chosen, int32_t otherwise) {
+    for (int32_t k = 0; k < song->nseg; k++) {
+        if (song->pairs[2 * k] <= chosen && chosen < song->pairs[2 * k + 1]) {
+            return song->pairs[2 * k + 1];
+        }
+    }
+    return otherwise;
+}
+
+// Where a region that begins at chosen ends when no valley tells.
+int32_t scan_for_end(const SONG *song, int32_t chosen) {
+    const float reference = song->norm[chosen];
+    float last = reference;
+    float lowest = 1.0f;
+    int32_t lowest_pos = 0;
+    int32_t drop_pos = 0;
+    bool found = false;
+    for (int32_t step = kScanBegin; step <= kScanEnd; step++) {
+        if (step >= song->n - chosen) {
+            if (lowest_pos == 0 && !found) return song->n - 1;
+            break;
+        }
+        const int32_t idx = chosen + step;
+        const float v = song->norm[idx];
+        if (v >= song->mean) continue;
+        if (is_drop(song, idx, last)) {
+            if (reference - v >= song->std) return idx;
+            drop_pos = idx;
+            found = true;
+            last = v;
+        } else if (!found && v < lowest) {
+            lowest = v;
+            lowest_pos = idx;
+        }
+    }
+    return found ? drop_pos : segment_end(song, chosen, lowest_pos);
+}
+
+int64_t place_start(const SONG *song, int32_t chosen, int32_t before, int64_t reach) {
+    const int64_t ideal = chosen - reach;
+    CANDIDATE valley = {};
+    if (before >= 0 && song->valleys[before] < chosen) {
+        valley = walk_towards(ideal, song->valleys, before, 0, -1);
+        if (valley.distance <= kNearIdeal) {
+            if (valley.pos != 0) return valley.pos;
+            valley.present = false;
+        }
+    }
+    CANDIDATE segment = {};
+    if (song->nseg >= 1) {
+        segment = walk_towards(ideal, song->pairs, 0, 2 * song->nseg - 1, 1);
+    }
+    const bool segment_usable = segment.present && segment.pos >= 1;
+    if (valley.present && valley.pos >= 1 && segment_usable) {
+        return segment.distance < valley.distance ? segment.pos : valley.pos;
+    }
+    if (segment_usable && !segment.ran_out) return segment.pos;
+    return ideal > 0 ? ideal : 0;
+}
+
+int64_t fit_in_song(const SONG *song, int64_t start, int32_t len_pts) {
+    if (start + len_pts <= song->n) return start;
+    const int64_t valley = song->nv > 0 ? song->valleys[0] : 0;
+    const int64_t segment = song->nseg > 0 ? song->pairs[0] : 0;
+    const int64_t first = valley < segment ? valley : segment;
+    return first + len_pts <= song->n ? first : 0;
+}
+
+}  // namespace
+
+uint32_t tavo_select_highlight_region(const float *norm, int32_t n, int32_t len_pts, int32_t chosen,
+                                      int32_t nv, const int32_t *valleys, const int32_t *pairs,
+                                      int32_t nseg, float mean, float std) {
+    if (chosen < 0 || chosen >= n) return 0;
+    const SONG song = {norm, n, nv, valleys, pairs, nseg, mean, std};
+    const int32_t before = valley_before(&song, chosen);
+    const bool valley_follows = before + 1 < nv && valleys[before + 1] - chosen <= kMaxToValley;
+    const int32_t end = valley_follows ? valleys[before + 1] : scan_for_end(&song, chosen);
+    const int32_t length = end > chosen ? end - chosen : 0;
+    const int64_t reach = static_cast<int64_t>(len_pts) - length;  // points wanted before chosen
+    const int64_t start = reach < kMinReach ? chosen : place_start(&song, chosen, before, reach);
+    return static_cast<uint32_t>(fit_in_song(&song, start, len_pts));
+}

@@ -1,0 +1,199 @@
+#include "highlight/search.h"
+
+#include <cstdlib>
+#include <cstring>
+
+#include "dsp/peaks.h"
+#include "dsp/sort.h"
+#include "dsp/stats.h"
+#include "highlight/region.h"
+
+namespace {
+
+constexpr int32_t kShortSong = 90;  // seconds; from here on the wider margins hold
+constexpr int32_t kSkip = 9;        // envelope points at the start where no edge is sought
+constexpr int32_t kTail = 25;       // points at the end where no edge is scored
+constexpr int32_t kShortTail = 10;
+constexpr int32_t kMinPoints = 4;     // a song needs more beyond the skip
+constexpr int32_t kMinSegment = 3;    // points of a loud segment
+constexpr int32_t kMinLoudAfter = 4;  // points that a segment must hold on after an edge
+constexpr int32_t kNearValley = 3;    // an edge this close before a valley leads nowhere
+constexpr int32_t kMaxSegments = 30;
+constexpr int32_t kMaxEdges = 10;
+constexpr int32_t kMaxValleys = 15;
+constexpr uint32_t kEdgeDistance = 1;
+constexpr int32_t kPercentile = 60;
+constexpr float kHopSeconds = 2.0f;
+constexpr double kMinSecondScore = 0.1;
+
+// The song as the search sees it. Entries of the lists beyond their counts are 0.
+struct SEARCH {
+    const float *norm;  // [n] envelope over its largest value
+    const float *diff;  // [n - 1] steps of norm
+    int32_t n;
+    int32_t skip;
+    int32_t tail;
+    float mean;  // of norm
+    float std;
+    float percentile;  // 60th, of norm
+    int32_t nseg;
+    int32_t start[kMaxSegments];  // last point before the rise
+    int32_t end[kMaxSegments];    // last point above the mean
+    int32_t nv;
+    int32_t valley[kMaxValleys];
+    int32_t edges;
+    uint32_t edge[kMaxEdges];  // relative to skip, largest step first
+};
+
+uint32_t point_ms(int64_t k) {
+    return static_cast<uint32_t>(static_cast<int64_t>(static_cast<float>(k + k) * 1000.0f));
+}
+
+// The largest value, and the 60th percentile in *percentile. False when memory runs out.
+bool rank_envelope(const float *power, int32_t n, float *largest, float *percentile) {
+    const size_t count = static_cast<size_t>(n);
+    float *sorted = static_cast<float *>(malloc(count * sizeof(float)));
+    if (sorted == nullptr) return false;
+    memcpy(sorted, power, count * sizeof(float));
+    qsort(sorted, count, sizeof(float), compare_fvalue);
+    *largest = sorted[n - 1];
+    *percentile = sorted[static_cast<int64_t>(n) * kPercentile / 100];
+    free(sorted);
+    return true;
+}
+
+void find_segments(SEARCH *s) {
+    bool above = false;  // whatever point 0 is: a song loud from there opens its segment at 0
+    for (int32_t k = 0; k < s->n - 1 && s->nseg < kMaxSegments; k++) {
+        const bool next_above = s->norm[k + 1] > s->mean;
+        if (!above && next_above) s->start[s->nseg] = k;
+        if (above && !next_above) {
+            if (k - s->start[s->nseg] + 1 >= kMinSegment) {
+                s->end[s->nseg] = k;
+                s->nseg++;
+            } else {
+                s->start[s->nseg] = 0;
+            }
+        }
+        above = next_above;
+    }
+}
+
+// Points from pos to the first valley after it; 0 when there is none.
+int32_t valley_distance(const SEARCH *s, int32_t pos) {
+    for (int32_t k = 0; k < s->nv; k++) {
+        if (s->valley[k] > pos) return s->valley[k] - pos;
+    }
+    return 0;
+}
+
+bool in_segment(const SEARCH *s, int32_t pos) {
+    if (pos > s->n - s->tail) return false;
+    for (int32_t k = 0; k < s->nseg; k++) {
+        if (s->start[k] <= pos && pos + kMinLoudAfter <= s->end[k]) return true;
+    }
+    return false;
+}
+
+// The best scored edge, or the second best when none is; 0 when no edge has a score.
+int32_t score_edges(const SEARCH *s) {
+    float best = 0.0f;
+    float second = 0.0f;
+    int32_t best_pos = 0;
+    int32_t second_pos = 0;
+    for (int32_t k = 0; k < s->edges; k++) {
+        const int32_t pos = static_cast<int32_t>(s->edge[k]) + s->skip;
+        if (!in_segment(s, pos)) continue;
+        const int32_t distance = valley_distance(s, pos);
+        if (distance >= 1 && distance <= kNearValley) continue;
+        const float *norm = s->norm + pos;
+        const float after = (norm[1] + norm[2]) * 0.5f;
+        const float before = (norm[0] + norm[-1]) * 0.5f;
+        if (after < before) continue;
+        const float score = after - before + s->diff[pos];
+        if (score > best) {
+            best = score;
+            best_pos = pos;
+        } else if (score > second && static_cast<double>(score) > kMinSecondScore) {
+            second = score;
+            second_pos = pos;
+        }
+    }
+    return best_pos != 0 ? best_pos : second_pos;
+}
+
+// The first edge that leads to a loud point; the last edge when none does.
+int32_t first_loud_edge(const SEARCH *s) {
+    int32_t pos = 0;
+    for (int32_t k = 0; k < s->edges; k++) {
+        pos = static_cast<int32_t>(s->edge[k]) + s->skip + 1;
+        const int32_t distance = valley_distance(s, pos);
+        const bool clear = distance == 0 || distance > kNearValley;
+        if (pos < s->n - s->tail && clear && s->norm[pos] > s->percentile) break;
+    }
+    return pos;
+}
+
+int32_t choose_edge(const SEARCH *s) {
+    const int32_t scored = score_edges(s);
+    return scored != 0 ? scored : first_loud_edge(s);
+}
+
+// Where the region may begin when it would run past the song's end.
+int32_t fallback_point(const SEARCH *s) {
+    const int32_t start = s->nseg > 0 ? s->start[0] : 0;
+    const int32_t valley = s->nv > 0 ? s->valley[0] : 0;
+    if (s->nseg > 0 && s->nv > 0) return start < valley ? start : valley;
+    return start > valley ? start : valley;
+}
+
+int64_t place_region(const SEARCH *s, int32_t chosen, int32_t hl_param) {
+    const int32_t len_pts = static_cast<int32_t>(0.5f * static_cast<float>(hl_param));
+    const int32_t fallback = fallback_point(s);
+    if (static_cast<int64_t>(fallback) + len_pts >= s->n) return fallback;
+    int32_t pairs[2 * kMaxSegments];
+    for (int32_t k = 0; k < s->nseg; k++) {
+        pairs[2 * k] = s->start[k];
+        pairs[2 * k + 1] = s->end[k];
+    }
+    return tavo_select_highlight_region(s->norm, s->n, len_pts, chosen, s->nv, s->valley, pairs,
+                                        s->nseg, s->mean, s->std);
+}
+
+// norm: [n] and diff: [n - 1], room to work in. Returns milliseconds.
+uint32_t search_envelope(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm, float *diff) {
+    SEARCH s = {};
+    s.norm = norm;
+    s.diff = diff;
+    s.n = hl->power_count;
+    s.skip = duration_s < kShortSong ? 0 : kSkip;
+    s.tail = duration_s < kShortSong ? kShortTail : kTail;
+    if (s.n - s.skip <= kMinPoints) return 0;
+
+    float largest = 0.0f;
+    if (!rank_envelope(hl->power, s.n, &largest, &s.percentile)) return 0;
+    if (largest == 0.0f) return 0;
+    s.percentile /= largest;
+    for (int32_t k = 0; k < s.n; k++) norm[k] = hl->power[k] / largest;
+    for (int32_t k = 0; k + 1 < s.n; k++) diff[k] = norm[k + 1] - norm[k];
+    getfloatMeanStd(norm, s.n, &s.mean, &s.std);
+
+    find_segments(&s);
+    s.edges = findsortedNPeaks(diff + s.skip, s.n - s.skip - 1, kEdgeDistance, kMaxEdges, s.edge);
+    s.nv = tavo_find_valley(norm, s.n, s.valley, s.mean, s.std, kHopSeconds);
+
+    const int32_t chosen = s.edges > 0 ? choose_edge(&s) : 0;
+    return point_ms(hl->hl_param > 0 ? place_region(&s, chosen, hl->hl_param) : chosen);
+}
+
+}  // namespace
+
+uint32_t _get_HL_simple(TAVO_HL_CTX *hl, int32_t duration_s) {
+    if (hl->power == nullptr || hl->power_count < 1) return 0;
+    const size_t count = static_cast<size_t>(hl->power_count);
+    float *norm = static_cast<float *>(malloc(2 * count * sizeof(float)));
+    if (norm == nullptr) return 0;
+    const uint32_t start = search_envelope(hl, duration_s, norm, norm + count);
+    free(norm);
+    return start;
+}

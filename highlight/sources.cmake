@@ -1,0 +1,7 @@
+set(highlight_sources
+  power_envelope.cpp
+  valleys.cpp
+  search.cpp
+  region.cpp
+  tune.cpp
+  position.cpp)

@@ -1,0 +1,2 @@
+set(jni_sources
+  tavo_jni.cpp)

@@ -1,0 +1,342 @@
+#include "jni/tavo_jni.h"
+
+#include <android/log.h>
+
+#include <cstdint>
+#include <cstdlib>
+
+extern "C" {
+pthread_mutex_t *tavo_jni_mutex = nullptr;
+}
+
+namespace {
+
+constexpr char kTag[] = "tavo_jni";
+constexpr char kHostClass[] = "com/kestu/tavo/Tavo";
+constexpr char kPostEvent[] = "postEventFromNative";
+constexpr char kPostEventSignature[] = "(Ljava/lang/Object;III[F)V";
+
+constexpr jint kEventResult = 1;
+constexpr jint kEventFailure = 2;
+
+// What native_setup stored. Counted, because a later native_setup may replace it while a worker
+// thread is in the middle of posting an event with it.
+struct host_refs {
+    jclass host_class;  // global reference
+    jobject object;     // global reference; null when the host gave null
+    int32_t users;      // the bridge itself and each event under way; under host_mutex
+};
+
+pthread_mutex_t host_mutex = PTHREAD_MUTEX_INITIALIZER;
+host_refs *current_host = nullptr;  // under host_mutex
+
+// What tavo_jni_mutex points at once init has run. Static, so that creating it cannot fail.
+pthread_mutex_t lifecycle_mutex = PTHREAD_MUTEX_INITIALIZER;
+
+// Pointers that one thread publishes and others read without a lock: atomic access only.
+JavaVM *java_vm = nullptr;
+jmethodID post_event = nullptr;
+TAVO_CTX *instance = nullptr;
+
+TAVO_PARAM init_param = {};  // under tavo_jni_mutex; path is null outside tavo_init
+
+// True on a worker thread while it posts an event: a deinit from there must not wait for the lock
+// that a deinit elsewhere holds while it waits for this very thread.
+thread_local bool posting = false;
+
+template <typename T>
+T *load_pointer(T *const *pointer) {
+    return __atomic_load_n(pointer, __ATOMIC_ACQUIRE);
+}
+
+template <typename T>
+void store_pointer(T **pointer, T *value) {
+    __atomic_store_n(pointer, value, __ATOMIC_RELEASE);
+}
+
+long handle_value(const TAVO_CTX *ctx) {
+    return static_cast<long>(reinterpret_cast<intptr_t>(ctx));
+}
+
+// ---- the lock of init and deinit ----
+
+// Creates the lock on first use: of two threads that come first together, both get the same one.
+pthread_mutex_t *lock_for_init() {
+    store_pointer(&tavo_jni_mutex, &lifecycle_mutex);
+    pthread_mutex_lock(&lifecycle_mutex);
+    return &lifecycle_mutex;
+}
+
+// Null, and nothing locked, when no init has ever run.
+pthread_mutex_t *lock_for_deinit() {
+    pthread_mutex_t *mutex = load_pointer(&tavo_jni_mutex);
+    if (mutex != nullptr) pthread_mutex_lock(mutex);
+    return mutex;
+}
+
+void unlock(pthread_mutex_t *mutex) {
+    if (mutex != nullptr) pthread_mutex_unlock(mutex);
+}
+
+// ---- the host's class and object ----
+
+host_refs *hold_host() {
+    pthread_mutex_lock(&host_mutex);
+    host_refs *host = current_host;
+    if (host != nullptr) ++host->users;
+    pthread_mutex_unlock(&host_mutex);
+    return host;
+}
+
+void delete_host(JNIEnv *env, host_refs *host) {
+    if (host->host_class != nullptr) env->DeleteGlobalRef(host->host_class);
+    if (host->object != nullptr) env->DeleteGlobalRef(host->object);
+    free(host);
+}
+
+// The last user deletes the references.
+void drop_host(JNIEnv *env, host_refs *host) {
+    if (host == nullptr) return;
+    pthread_mutex_lock(&host_mutex);
+    const bool last = --host->users == 0;
+    pthread_mutex_unlock(&host_mutex);
+    if (last) delete_host(env, host);
+}
+
+// Null when memory or a global reference cannot be had.
+host_refs *make_host(JNIEnv *env, jclass host_class, jobject obj) {
+    auto *host = static_cast<host_refs *>(calloc(1, sizeof(host_refs)));
+    if (host == nullptr) return nullptr;
+    host->users = 1;
+    host->host_class = static_cast<jclass>(env->NewGlobalRef(host_class));
+    // Nothing more may be asked for once one request has failed.
+    if (host->host_class != nullptr && obj != nullptr) host->object = env->NewGlobalRef(obj);
+    if (host->host_class == nullptr || (obj != nullptr && host->object == nullptr)) {
+        delete_host(env, host);
+        return nullptr;
+    }
+    return host;
+}
+
+// ---- init ----
+
+// Null when the class or the method is missing; the exception that says so is cleared.
+jmethodID find_post_event(JNIEnv *env) {
+    jmethodID method = nullptr;
+    jclass host_class = env->FindClass(kHostClass);
+    if (host_class != nullptr) {
+        method = env->GetStaticMethodID(host_class, kPostEvent, kPostEventSignature);
+        env->DeleteLocalRef(host_class);
+    }
+    if (method == nullptr) env->ExceptionClear();
+    return method;
+}
+
+// Under the lock. The characters are the caller's and may be given back once this returns.
+TAVO_CTX *create_instance(const char *path, jint mode, int32_t *err) {
+    init_param.path = path;
+    init_param.mode = mode;
+    TAVO_CTX *ctx = tavo_init(&init_param, err);
+    init_param.path = nullptr;
+    return ctx;
+}
+
+// Under the lock. The handle is published last: whoever sees it may start it.
+jint adopt_instance(JNIEnv *env, TAVO_CTX *ctx) {
+    jmethodID method = find_post_event(env);
+    if (method == nullptr) {
+        tavo_deinit(ctx);
+        return TAVO_ERR_HANDLE;
+    }
+    store_pointer(&post_event, method);
+    tavo_setcallback(ctx, tavocallback);
+    store_pointer(&instance, ctx);
+    return TAVO_OK;
+}
+
+jint already_opened() {
+    __android_log_print(ANDROID_LOG_ERROR, kTag, "tavo_init is failed. already opened. ");
+    return TAVO_ERR_BUSY;
+}
+
+jint init_failed(jint code) {
+    __android_log_print(ANDROID_LOG_ERROR, kTag, "tavo_init is failed. error=%d", code);
+    return code;
+}
+
+// Under the lock, with the path's characters in hand, which it gives back on every way out.
+jint init_locked(JNIEnv *env, jstring path, const char *chars, jint mode) {
+    if (load_pointer(&instance) != nullptr) {
+        env->ReleaseStringUTFChars(path, chars);
+        return already_opened();
+    }
+    int32_t err = TAVO_OK;
+    TAVO_CTX *ctx = create_instance(chars, mode, &err);
+    env->ReleaseStringUTFChars(path, chars);
+    if (ctx != nullptr) err = adopt_instance(env, ctx);
+    if (err != TAVO_OK) return init_failed(err);
+    __android_log_print(ANDROID_LOG_VERBOSE, kTag, "tavo_init and setcallback is finished");
+    return TAVO_OK;
+}
+
+// ---- deinit ----
+
+jint deinit_failed(const TAVO_CTX *ctx, jint code) {
+    __android_log_print(ANDROID_LOG_ERROR, kTag, "tavo_deinit(%ld) is failed. error=%d",
+                        handle_value(ctx), code);
+    return -1;
+}
+
+jint deinit_locked() {
+    TAVO_CTX *ctx = load_pointer(&instance);
+    if (ctx == nullptr) {
+        __android_log_print(ANDROID_LOG_ERROR, kTag, "tavo_deinit() is failed. no instance");
+        return 0;
+    }
+    const int32_t result = tavo_deinit(ctx);
+    if (result != TAVO_OK) return deinit_failed(ctx, result);
+    __android_log_print(ANDROID_LOG_VERBOSE, kTag, "tavo_deinit(%ld) is finished successfully",
+                        handle_value(ctx));
+    store_pointer(&instance, static_cast<TAVO_CTX *>(nullptr));
+    return 0;
+}
+
+// ---- events ----
+
+// The environment's type in AttachCurrentThread differs between the JDK's header and the NDK's.
+template <typename Vm, typename Env>
+jint attach_thread(Vm *vm, jint (Vm::*attach)(Env **, void *), JNIEnv **env) {
+    Env *attached = nullptr;
+    const jint result = (vm->*attach)(&attached, nullptr);
+    *env = static_cast<JNIEnv *>(attached);
+    return result;
+}
+
+// This thread's environment, attaching the thread when it has none; null when that fails.
+JNIEnv *environment(JavaVM *vm, bool *attached_here) {
+    void *known = nullptr;
+    if (vm->GetEnv(&known, JNI_VERSION_1_6) == JNI_OK) return static_cast<JNIEnv *>(known);
+    JNIEnv *env = nullptr;
+    *attached_here = attach_thread(vm, &JavaVM::AttachCurrentThread, &env) == JNI_OK;
+    return *attached_here ? env : nullptr;
+}
+
+void notification_failed(JNIEnv *env) {
+    __android_log_print(ANDROID_LOG_ERROR, kTag, "An exception occurred while notifying an event.");
+    env->ExceptionClear();
+}
+
+// A local reference, or null with nothing pending when the virtual machine has no room.
+jfloatArray copy_beats(JNIEnv *env, const TAVO_INFO *info) {
+    jfloatArray beats = env->NewFloatArray(info->beat_count);
+    if (beats == nullptr) {
+        notification_failed(env);
+        return nullptr;
+    }
+    env->SetFloatArrayRegion(beats, 0, info->beat_count, info->beat_times);
+    return beats;
+}
+
+void post(JNIEnv *env, const host_refs *host, const TAVO_INFO *info) {
+    jmethodID method = load_pointer(&post_event);
+    const bool has_beats = info->status == 0 && info->beat_count >= 1;
+    jfloatArray beats = has_beats ? copy_beats(env, info) : nullptr;
+    const bool failed = info->status != 0 || (has_beats && beats == nullptr);
+    const jint what = failed ? kEventFailure : kEventResult;
+    const jint count = beats != nullptr ? info->beat_count : 0;
+
+    env->CallStaticVoidMethod(host->host_class, method, host->object, what, info->hl_pos, count,
+                              beats);
+    // The thread may have been attached before and live on: its local references are not ours to
+    // leave behind.
+    if (beats != nullptr) env->DeleteLocalRef(beats);
+    if (env->ExceptionCheck() == JNI_TRUE) notification_failed(env);
+}
+
+}  // namespace
+
+extern "C" {
+
+JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *vm, void *) {
+    store_pointer(&java_vm, vm);
+    void *env = nullptr;
+    return vm->GetEnv(&env, JNI_VERSION_1_6) == JNI_OK ? JNI_VERSION_1_6 : -1;
+}
+
+JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobject thiz,
+                                                              jobject obj) {
+    jclass host_class = env->GetObjectClass(thiz);
+    host_refs *host = host_class != nullptr ? make_host(env, host_class, obj) : nullptr;
+    if (host_class != nullptr) env->DeleteLocalRef(host_class);
+    if (host == nullptr) {
+        __android_log_print(ANDROID_LOG_ERROR, kTag, "Can't find com/kestu/tavo/Tavo");
+        env->ExceptionClear();
+        return;
+    }
+    pthread_mutex_lock(&host_mutex);
+    host_refs *replaced = current_host;
+    current_host = host;
+    pthread_mutex_unlock(&host_mutex);
+    drop_host(env, replaced);
+}
+
+JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject, jstring path,
+                                                     jint mode) {
+    // Inside an event there is an instance, and whoever is ending it holds the lock.
+    if (posting && load_pointer(&instance) != nullptr) return already_opened();
+    const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
+    if (chars == nullptr) {
+        env->ExceptionClear();
+        return init_failed(TAVO_ERR_HANDLE);
+    }
+    pthread_mutex_t *mutex = lock_for_init();
+    const jint result = init_locked(env, path, chars, mode);
+    unlock(mutex);
+    return result;
+}
+
+JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *, jobject, jint hl_param,
+                                                        jint max_beats, jint beat_param2) {
+    TAVO_CTX *ctx = load_pointer(&instance);
+    if (ctx == nullptr) return 0;
+    const int32_t result = tavo_analyze(ctx, hl_param, max_beats, beat_param2);
+    if (result < 0) {
+        __android_log_print(ANDROID_LOG_ERROR, kTag, "tavo_analyze() is failed. error=%d", result);
+        return -1;
+    }
+    __android_log_print(ANDROID_LOG_VERBOSE, kTag, "tavo_analyze (id:%ld) - start",
+                        handle_value(ctx));
+    return result == 0 ? 0 : -1;
+}
+
+JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *, jobject) {
+    TAVO_CTX *posting_ctx = posting ? load_pointer(&instance) : nullptr;
+    if (posting_ctx != nullptr) return deinit_failed(posting_ctx, TAVO_ERR_HANDLE);
+    pthread_mutex_t *mutex = lock_for_deinit();
+    const jint result = deinit_locked();
+    unlock(mutex);
+    return result;
+}
+
+void tavocallback(TAVO_INFO *info) {
+    JavaVM *vm = load_pointer(&java_vm);
+    bool attached_here = false;
+    JNIEnv *env = vm != nullptr ? environment(vm, &attached_here) : nullptr;
+    if (env == nullptr) {
+        __android_log_print(ANDROID_LOG_ERROR, kTag,
+                            "Failed to get the environment using AttachCurrentThread()");
+        return;
+    }
+    host_refs *host = hold_host();
+    if (host != nullptr && load_pointer(&post_event) != nullptr) {
+        posting = true;
+        post(env, host, info);
+        posting = false;
+    } else {  // native_setup or init never came: nobody to tell but the log
+        notification_failed(env);
+    }
+    drop_host(env, host);
+    // The runtime counts an attached thread as running: one that ends so aborts or holds it up.
+    if (attached_here) vm->DetachCurrentThread();
+}
+}

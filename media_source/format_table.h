@@ -1,0 +1,19 @@
+// Which format source serves a type code.
+#ifndef TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
+#define TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
+
+#include "media_source/mtsrc_ctx.h"
+
+struct format_ops {
+    int32_t type;  // type code of recognition
+    int32_t (*open)(mtsrc_ctx *src);
+    void (*close)(mtsrc_ctx *src);
+    int32_t (*get_frm)(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+    int32_t (*seek)(mtsrc_ctx *src, int64_t position, int64_t *reached);
+    int32_t (*reset)(mtsrc_ctx *src);
+};
+
+// Null for a type that no source serves.
+const format_ops *format_ops_of(int32_t type);
+
+#endif

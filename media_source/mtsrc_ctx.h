@@ -1,0 +1,94 @@
+// The source handle, for the frame and the format sources only.
+#ifndef TAVO_MEDIA_SOURCE_MTSRC_CTX_H
+#define TAVO_MEDIA_SOURCE_MTSRC_CTX_H
+
+#include <pthread.h>
+
+#include "media_source/mtsrc.h"
+
+constexpr int32_t kQueueBytes = 1'048'576;
+
+// Codec codes of the codec library, handed to its decoders in every frame record.
+constexpr int32_t kCodecMpeg = 305;
+constexpr int32_t kCodecAac = 306;
+constexpr int32_t kCodecFlac = 322;
+constexpr int32_t kCodecVorbis = 323;
+
+// The queue holds 16-bit mono PCM. q_base <= q_rd <= q_wr; q_fill = q_wr - q_rd;
+// q_room = q_cap - (q_wr - q_base).
+struct mtsrc_ctx {
+    uint32_t mark;  // "KOVA" in memory order once the source is open
+    int32_t (*open)(mtsrc_ctx *src);
+    void (*close)(mtsrc_ctx *src);
+    int32_t (*get_frm)(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+    int32_t (*seek)(mtsrc_ctx *src, int64_t position, int64_t *reached);
+    int32_t (*reset)(mtsrc_ctx *src);
+    mtsrc_io io;             // the path buffer is owned
+    mtsrc_file *probe_file;  // opened for recognition, kept to the end, owned
+    mtsrc_format format;
+    int32_t codec;    // the type code, then the stream's codec code
+    void *demux;      // reader or demuxer, owned
+    void *dstream;    // demuxer's stream (MP4, Ogg), owned
+    void *decoder;    // owned; null for WAV
+    uint8_t *q_base;  // [q_cap] owned
+    int32_t q_cap;    // bytes
+    int32_t q_fill;   // bytes held
+    int32_t q_room;   // bytes free behind q_wr
+    uint8_t *q_rd;
+    uint8_t *q_wr;
+    int32_t frm_buf_size;  // bytes of one compressed frame's buffer
+    pthread_mutex_t lock;  // held by reset and deinit
+};
+static_assert(offsetof(mtsrc_ctx, io) == 48 && offsetof(mtsrc_ctx, format) == 176);
+static_assert(offsetof(mtsrc_ctx, codec) == 200 && offsetof(mtsrc_ctx, q_base) == 232);
+static_assert(offsetof(mtsrc_ctx, lock) == 280);
+
+extern "C" {
+
+// The five operations of each format source; open returns 0 or the frame's error codes.
+int32_t mtsource_wav_open(mtsrc_ctx *src);
+void mtsource_wav_close(mtsrc_ctx *src);
+int32_t mtsource_wav_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+int32_t mtsource_wav_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
+int32_t mtsource_wav_reset(mtsrc_ctx *src);
+
+int32_t mtsource_aac_open(mtsrc_ctx *src);
+void mtsource_aac_close(mtsrc_ctx *src);
+int32_t mtsource_aac_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+int32_t mtsource_aac_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
+int32_t mtsource_aac_reset(mtsrc_ctx *src);
+
+int32_t mtsource_flac_open(mtsrc_ctx *src);
+void mtsource_flac_close(mtsrc_ctx *src);
+int32_t mtsource_flac_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+int32_t mtsource_flac_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
+int32_t mtsource_flac_reset(mtsrc_ctx *src);
+
+int32_t mtsource_mp123_open(mtsrc_ctx *src);
+void mtsource_mp123_close(mtsrc_ctx *src);
+int32_t mtsource_mp123_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+int32_t mtsource_mp123_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
+int32_t mtsource_mp123_reset(mtsrc_ctx *src);
+
+int32_t mtsource_mp4a_open(mtsrc_ctx *src);
+void mtsource_mp4a_close(mtsrc_ctx *src);
+int32_t mtsource_mp4a_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+int32_t mtsource_mp4a_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
+int32_t mtsource_mp4a_reset(mtsrc_ctx *src);
+
+int32_t mtsource_ogg_open(mtsrc_ctx *src);
+void mtsource_ogg_close(mtsrc_ctx *src);
+int32_t mtsource_ogg_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+int32_t mtsource_ogg_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
+int32_t mtsource_ogg_reset(mtsrc_ctx *src);
+
+// Sample rate that the decoder reports for the next frame, which is consumed; -1 on failure.
+int32_t aac_get_hz(void *reader, void *decoder);
+
+// Index of the first audio track or stream, -1 without one. The argument is the file-information
+// record.
+int32_t get_mp4_audiostream(const void *info);
+int32_t get_ogg_audiostream(const void *info);
+}
+
+#endif

@@ -1,0 +1,107 @@
+#include "media_source/pcm_queue.h"
+
+#include <cstdlib>
+#include <cstring>
+
+namespace {
+
+constexpr int32_t kBytesPerSample = 2;
+
+void make_room(mtsrc_ctx *src) {
+    memmove(src->q_base, src->q_rd, static_cast<size_t>(src->q_fill));
+    src->q_rd = src->q_base;
+    src->q_wr = src->q_base + src->q_fill;
+    src->q_room = src->q_cap - src->q_fill;
+}
+
+void deliver(mtsrc_ctx *src, int32_t bytes, mtsrc_frame *frame) {
+    memcpy(frame->data, src->q_rd, static_cast<size_t>(bytes));
+    frame->size = bytes;
+    src->q_rd += bytes;
+    src->q_fill -= bytes;
+}
+
+// Returns 0 with want bytes held, else what ended the filling.
+int32_t fill_to(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill &fill) {
+    while (src->q_fill < want) {
+        if (src->q_room <= fill.room) {
+            make_room(src);
+            if (src->q_room <= fill.room) {
+                return -4;
+            }
+        }
+        const int32_t code = fill.step(src, frame_buf, fill.work);
+        if (code != 0) {
+            return code;
+        }
+    }
+    return 0;
+}
+
+int16_t load(const uint8_t *pcm, int64_t sample) {
+    int16_t value;
+    memcpy(&value, pcm + sample * kBytesPerSample, sizeof(value));
+    return value;
+}
+
+void store(uint8_t *pcm, int64_t sample, int16_t value) {
+    memcpy(pcm + sample * kBytesPerSample, &value, sizeof(value));
+}
+
+}  // namespace
+
+void pcm_queue_clear(mtsrc_ctx *src) {
+    src->q_rd = src->q_base;
+    src->q_wr = src->q_base;
+    src->q_fill = 0;
+    src->q_room = src->q_cap;
+}
+
+void pcm_queue_push(mtsrc_ctx *src, int32_t bytes) {
+    src->q_wr += bytes;
+    src->q_fill += bytes;
+    src->q_room -= bytes;
+}
+
+int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pcm_fill &fill) {
+    if (!frame || !frame->data || want < 0) {
+        return -4;
+    }
+    auto *frame_buf = static_cast<uint8_t *>(malloc(static_cast<size_t>(src->frm_buf_size)));
+    if (!frame_buf) {
+        return -2;
+    }
+    const int32_t code = fill_to(src, want, frame_buf, fill);
+    if (code == 0) {
+        deliver(src, want, frame);
+    } else if (code == 1) {
+        deliver(src, src->q_fill, frame);
+    }
+    free(frame_buf);
+    return code;
+}
+
+int32_t pcm_first_channel(uint8_t *to, const uint8_t *from, int32_t bytes, int32_t channels) {
+    if (channels <= 1) {
+        memmove(to, from, static_cast<size_t>(bytes));
+        return bytes;
+    }
+    const int32_t count = bytes / kBytesPerSample / channels;
+    for (int64_t j = 0; j < count; ++j) {
+        store(to, j, load(from, j * channels));
+    }
+    return bytes / channels;
+}
+
+int32_t pcm_mean_of_two(uint8_t *to, const uint8_t *from, int32_t bytes, int32_t channels) {
+    if (channels <= 1) {
+        memmove(to, from, static_cast<size_t>(bytes));
+        return bytes;
+    }
+    const int32_t count = bytes / kBytesPerSample / channels;
+    for (int64_t j = 0; j < count; ++j) {
+        const int32_t sum = load(from, j * channels) + load(from, j * channels + 1);
+        store(to, j, static_cast<int16_t>(sum / 2));
+    }
+    return bytes / channels;
+}

@@ -1,0 +1,14 @@
+set(media_source_sources
+  frame.cpp
+  file_io.cpp
+  format_table.cpp
+  recognise.cpp
+  probe_mpeg.cpp
+  pcm_queue.cpp
+  source_wav.cpp
+  elementary.cpp
+  source_aac.cpp
+  source_flac.cpp
+  source_mp123.cpp
+  source_mp4a.cpp
+  source_ogg.cpp)

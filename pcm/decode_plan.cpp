@@ -1,0 +1,163 @@
+#include <algorithm>
+#include <cstdlib>
+
+#include "pcm/byte_size.h"
+#include "pcm/decode.h"
+#include "platform/worker_group.h"
+
+pthread_mutex_t *ext_mutex_mt = nullptr;
+pthread_cond_t *ext_cond_mt = nullptr;
+
+namespace {
+
+constexpr int64_t kRefusedUnits = kUnitsPerSecond;  // streams up to this length are refused
+constexpr int32_t kLowestRate = 8000;               // Hz
+constexpr int64_t kSingleThreadUnits = 50'000'000;  // up to 5 s one thread is enough
+constexpr int32_t kParallelSegments = 4;
+constexpr int64_t kOverlapUnits = 20'000'000;  // decoded beyond a segment's share, for the seam
+
+int32_t segments_for(int64_t units) {
+    return units > kSingleThreadUnits ? kParallelSegments : 1;
+}
+
+// Learns format and duration from a source that is closed again.
+int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
+    int32_t err = 0;
+    mtsrc_ctx *probe = mtsrc_init(open_param, &err);
+    if (probe == nullptr) return TAVO_ERR_HANDLE;
+    mtsrc_format format = {};
+    const int32_t result = mtsrc_getstream_format(probe, &format);
+    mtsrc_deinit(probe);
+
+    int64_t bytes = 0;
+    if (result != 0 || format.duration <= kRefusedUnits || format.sample_rate < kLowestRate ||
+        !span_bytes(format.duration, format.sample_rate, &bytes)) {
+        return TAVO_ERR_FORMAT;
+    }
+    ctx->fmt = {format.sample_rate, format.channels, format.bits};
+    ctx->duration = format.duration;
+    return 0;
+}
+
+// Gives a segment of the current plan a buffer and moves its source to start.
+int32_t place_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_len) {
+    TAVO_DECSEG *seg = &ctx->seg[index];
+    const int32_t count = ctx->seg_count;
+    const bool last = index == count - 1;
+    seg->index = index;
+    seg->count = count;
+    seg->start = start;
+    seg->got = 0;
+    if (!span_bytes(last ? seg_len : seg_len + kOverlapUnits, ctx->fmt.sample_rate, &seg->cap)) {
+        return TAVO_ERR_MEMORY;
+    }
+    seg->buf = static_cast<uint8_t *>(malloc(static_cast<size_t>(seg->cap)));
+    if (seg->buf == nullptr) return TAVO_ERR_MEMORY;
+
+    seg->seek_pos = start;  // stands when the seek fails without reporting a position
+    mtsrc_seekstream(seg->src, start, &seg->seek_pos);
+    return 0;
+}
+
+// Allocates the cleared PCM buffer for units of stream.
+int32_t make_pcm(TAVO_CTX *ctx, int64_t units) {
+    int64_t bytes = 0;
+    if (!span_bytes(units, ctx->fmt.sample_rate, &bytes) || bytes == 0) return TAVO_ERR_MEMORY;
+    ctx->pcm = static_cast<int16_t *>(calloc(static_cast<size_t>(bytes), 1));
+    if (ctx->pcm == nullptr) return TAVO_ERR_MEMORY;
+    ctx->pcm_bytes = bytes;
+    return 0;
+}
+
+// The table of seg_count cleared records that share one array of done flags.
+int32_t make_table(TAVO_CTX *ctx, const mtsrc_param *open_param) {
+    const auto count = static_cast<size_t>(ctx->seg_count);
+    ctx->seg = static_cast<TAVO_DECSEG *>(calloc(count, sizeof(TAVO_DECSEG)));
+    if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
+    auto *done = static_cast<int32_t *>(calloc(count, sizeof(int32_t)));
+    if (done == nullptr) return TAVO_ERR_MEMORY;
+
+    for (size_t i = 0; i < count; ++i) {
+        TAVO_DECSEG *seg = &ctx->seg[i];
+        seg->done = done;
+        seg->mutex = ext_mutex_mt;
+        seg->cond = ext_cond_mt;
+        seg->open_param = *open_param;
+        seg->fmt = ctx->fmt;
+        seg->duration = ctx->duration;
+    }
+    return 0;
+}
+
+// All of the setup; what it made before a failure is left to tavo_decode_deinit.
+int32_t build_decoding(TAVO_CTX *ctx, const mtsrc_param *open_param) {
+    int32_t err = worker_lock_create(&ext_mutex_mt, &ext_cond_mt);
+    if (err == 0) err = read_stream_format(ctx, open_param);
+    if (err != 0) return err;
+
+    ctx->seg_count = segments_for(ctx->duration);
+    err = make_table(ctx, open_param);
+    if (err != 0) return err;
+
+    const int64_t seg_len = ctx->duration / ctx->seg_count;
+    for (int32_t i = 0; i < ctx->seg_count; ++i) {
+        TAVO_DECSEG *seg = &ctx->seg[i];
+        err = TAVO_ERR_HANDLE;
+        seg->src = mtsrc_init(&seg->open_param, &err);
+        if (seg->src == nullptr) return err;
+        err = place_segment(ctx, i, i * seg_len, seg_len);
+        if (err != 0) return err;
+    }
+    return make_pcm(ctx, ctx->duration);
+}
+
+}  // namespace
+
+int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param) {
+    const mtsrc_param open_param = {param->path};
+    const int32_t err = build_decoding(ctx, &open_param);
+    if (err != 0) tavo_decode_deinit(ctx);
+    return err;
+}
+
+void tavo_decode_deinit(TAVO_CTX *ctx) {
+    if (ctx->seg != nullptr) {
+        free(ctx->seg[0].done);
+        // A later plan may use fewer records than setup made, and all of them hold a source.
+        const int32_t made = segments_for(ctx->duration);
+        for (int32_t i = 0; i < made; ++i) {
+            if (ctx->seg[i].src != nullptr) mtsrc_deinit(ctx->seg[i].src);
+            free(ctx->seg[i].buf);
+        }
+        free(ctx->seg);
+        ctx->seg = nullptr;
+    }
+    free(ctx->pcm);
+    ctx->pcm = nullptr;
+    worker_lock_release(&ext_mutex_mt, &ext_cond_mt);
+}
+
+int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start) {
+    int64_t rest = 0;
+    ctx->pcm = nullptr;
+    ctx->pcm_bytes = 0;
+    if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
+    // The caller has freed the buffers: nothing that fails below may leave them to a release.
+    const int32_t made = segments_for(ctx->duration);
+    for (int32_t i = 0; i < made; ++i) ctx->seg[i].buf = nullptr;
+    if (__builtin_sub_overflow(ctx->duration, start, &rest) || rest <= 0) return TAVO_ERR_MEMORY;
+
+    // A start before the stream's own must not ask for more records than setup made.
+    ctx->seg_count = std::min(segments_for(rest), made);
+    const int64_t seg_len = rest / ctx->seg_count;
+    int32_t err = 0;
+    for (int32_t i = 0; i < ctx->seg_count && err == 0; ++i) {
+        err = place_segment(ctx, i, start + i * seg_len, seg_len);
+    }
+    if (err == 0) err = make_pcm(ctx, rest);
+    for (int32_t i = 0; i < made && err != 0; ++i) {
+        free(ctx->seg[i].buf);
+        ctx->seg[i].buf = nullptr;
+    }
+    return err;
+}

@@ -1,0 +1,44 @@
+#include "pcm/decode.h"
+#include "pcm/read_pcm.h"
+#include "pcm/stitch.h"
+#include "platform/worker_group.h"
+
+namespace {
+
+constexpr int32_t kMaxSegments = 4;
+
+void decode_segment(void *record) {
+    auto *seg = static_cast<TAVO_DECSEG *>(record);
+    if (seg->src == nullptr) return;
+    seg->got = read_pcm(seg->src, seg->buf, seg->cap);
+}
+
+}  // namespace
+
+void thd_cleanup(void *seg) {
+    const auto *self = static_cast<TAVO_DECSEG *>(seg);
+    worker_group_done(self->mutex, self->cond, self->done, self->count, self->index);
+}
+
+void *_tavo_mtproc_decoding(void *seg) {
+    pthread_cleanup_push(thd_cleanup, seg);
+    decode_segment(seg);
+    pthread_exit(nullptr);
+    pthread_cleanup_pop(0);
+}
+
+int64_t DecodePcmMT(TAVO_CTX *ctx, void *dst, int64_t dst_capacity) {
+    const int32_t count = ctx->seg_count;
+    if (ctx->seg == nullptr || ext_mutex_mt == nullptr) return 0;
+    if (count < 1 || count > kMaxSegments) return 0;
+
+    worker_slot slots[kMaxSegments] = {};
+    for (int32_t i = 0; i < count; ++i) {
+        TAVO_DECSEG *seg = &ctx->seg[i];
+        slots[i] = {seg, &seg->thread, _tavo_mtproc_decoding, decode_segment};
+    }
+    worker_group_run(slots, count, ext_mutex_mt, ext_cond_mt, ctx->seg[0].done);
+
+    return stitch_segments(ctx->seg, count, ctx->fmt.sample_rate, static_cast<uint8_t *>(dst),
+                           dst_capacity);
+}

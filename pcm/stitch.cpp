@@ -1,0 +1,46 @@
+#include "pcm/stitch.h"
+
+#include <algorithm>
+
+namespace {
+
+// The last place in dst[1, total - 200] that holds the first bytes of data, or total without one.
+int64_t find_seam(const uint8_t *dst, int64_t total, const uint8_t *data) {
+    const match_block block = {data, load_head(data)};
+    for (int64_t place = total - kMatchBytes; place >= 1; --place) {
+        if (block_is_at(block, dst + place)) return place;
+    }
+    return total;
+}
+
+}  // namespace
+
+int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
+                        int64_t capacity) {
+    const int64_t skip = segment_skip(rate);
+    if (dst == nullptr || capacity < 1 || skip < 1) return 0;
+
+    int64_t total = 0;
+    for (int32_t k = 0; k < count; ++k) {
+        if (seg[k].buf == nullptr || seg[k].got < 1) return 0;
+        const int64_t drop = k == 0 ? 0 : skip;
+        const int64_t avail = seg[k].got - drop;
+        if (avail < 1) return 0;
+
+        const uint8_t *data = seg[k].buf + drop;
+        if (k > 0 && total > kMatchBytes && avail >= kMatchBytes) {
+            total = find_seam(dst, total, data);
+        }
+        const int64_t bytes = std::min(capacity - total, avail);
+        if (bytes < 1) return 0;
+        memcpy(dst + total, data, static_cast<size_t>(bytes));
+        total += bytes;
+    }
+    return total;
+}
+
+void stereo2mono(int16_t *dst, const int16_t *src, int32_t frames) {
+    for (int64_t i = 0; i < frames; ++i) {
+        dst[i] = static_cast<int16_t>((src[2 * i] + src[2 * i + 1]) / 2);
+    }
+}

@@ -1,0 +1,2 @@
+set(platform_sources
+  worker_group.cpp)

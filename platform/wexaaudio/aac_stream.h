@@ -1,0 +1,54 @@
+// The raw blocks of one AAC track and how they are handed out, shared by the ADTS/ADIF reader and
+// the MP4 demuxer.
+//
+// In: where each raw block lies in the file, the configuration. Out: bundles (bundle.h) for
+// aac_decoder.cpp, every one of which decodes to frame_samples sample frames.
+//
+// A decoder's noise generator carries history, so the same block decoded after a seek would differ
+// from a linear read. Therefore the track is cut into groups of frames; the first frame of each
+// group, and the first frame after a seek, is handed out with the frames from preroll before its
+// group's start up to it, to be decoded by a fresh decoder that outputs the last one. The output is
+// then a function of the place in the file alone.
+#ifndef WEXAAUDIO_AAC_STREAM_H
+#define WEXAAUDIO_AAC_STREAM_H
+
+#include <cstdint>
+
+#include "platform/wexaaudio/aac_config.h"
+#include "platform/wexaaudio/frame_index.h"
+#include "platform/wexaaudio/io_file.h"
+
+constexpr int32_t kAacFrameBuffer = 24576;  // bytes: what the sources read a frame into
+
+struct aac_stream {
+    io_file *file;      // not owned
+    frame_index index;  // owned; the raw blocks, without ADTS headers
+    aac_config config;
+    int32_t sample_rate;    // Hz, of the output
+    int32_t channels;       // of the output
+    int32_t frame_samples;  // sample frames that each block decodes to
+    int32_t preroll;        // frames
+    int32_t group;          // frames
+    int64_t next;           // frame to be handed out next
+    bool fresh;             // the next frame starts a decoder
+};
+
+// With file, index and config set: decodes the first frames to learn what the headers do not say
+// (or say wrongly), makes the configuration explicit, fills in the index and chooses the groups.
+// False when nothing there decodes or out of memory.
+bool aac_stream_learn(aac_stream *s);
+
+// The next bundle: 0, 1 at the end, -1 when the file cannot be read. A block that does not fit the
+// buffer is handed out as silence. first and second: start and length, 100-ns units.
+int32_t aac_stream_read(aac_stream *s, void *buf, int32_t size, int32_t *bytes, int64_t *first,
+                        int64_t *second);
+
+// Moves to the first frame that starts at or after position (100-ns units), at most to the last.
+int32_t aac_stream_seek(aac_stream *s, int64_t position, int64_t *reached);
+
+// Length of the track, 100-ns units.
+int64_t aac_stream_duration(const aac_stream *s);
+
+void aac_stream_free(aac_stream *s);
+
+#endif

@@ -1,0 +1,34 @@
+// What one scan of a file finds: every frame with its place in the file and in the stream. Made at
+// open; durations and seeks are looked up here, never estimated.
+#ifndef WEXAAUDIO_FRAME_INDEX_H
+#define WEXAAUDIO_FRAME_INDEX_H
+
+#include <cstdint>
+
+struct frame_entry {
+    int64_t offset;   // bytes from the start of the file
+    int64_t first;    // the frame's first sample in the decoded stream, sample frames
+    int32_t bytes;    // of the whole frame
+    int32_t samples;  // sample frames that it decodes to
+};
+
+struct frame_index {
+    frame_entry *entry;  // [room] owned, count used, ascending
+    int64_t count;
+    int64_t room;
+};
+
+// Appends; first is set by the index to the end of the frame before when it is negative. False when
+// out of memory or past kMaxSamples, with the index unchanged.
+bool frame_index_add(frame_index *index, frame_entry entry);
+
+// Number of the frame that holds sample: the last whose first is at or before it; 0 before the
+// first frame, count - 1 past the end; -1 on an empty index.
+int64_t frame_index_find(const frame_index *index, int64_t sample);
+
+// End of the last frame, sample frames; 0 when empty.
+int64_t frame_index_end(const frame_index *index);
+
+void frame_index_free(frame_index *index);
+
+#endif

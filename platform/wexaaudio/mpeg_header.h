@@ -1,0 +1,39 @@
+// The four bytes that start every MPEG audio frame (ISO/IEC 11172-3, 13818-3 and its 2.5
+// extension), and what of a frame's body the reader must know.
+#ifndef WEXAAUDIO_MPEG_HEADER_H
+#define WEXAAUDIO_MPEG_HEADER_H
+
+#include <cstdint>
+
+constexpr int32_t kMpegHeaderBytes = 4;
+constexpr int32_t kMpegMaxFrame = 1732;    // bytes: Layer II, 384 kbit/s at 32 kHz, padded
+constexpr int32_t kMpegMaxBackstep = 511;  // bytes of main data before a Layer III frame
+
+struct mpeg_header {
+    int32_t version;   // 1, 2, or 25 for 2.5
+    int32_t layer;     // 1 to 3
+    int32_t rate;      // Hz
+    int32_t channels;  // 1 or 2
+    int32_t samples;   // sample frames
+    int32_t bytes;     // of the frame
+    bool has_crc;      // two bytes behind the header
+};
+
+// False when the four bytes are no header, or one of free format, which has no length.
+bool mpeg_parse(const uint8_t *p, mpeg_header *h);
+
+// Same version, layer and rate: frames of one stream.
+bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
+
+// Bytes from a Layer III frame's start to its main data.
+int32_t mpeg_main_data_at(const mpeg_header *h);
+
+// How many bytes before its main data a Layer III frame reaches back; 0 for the other layers. p
+// holds the frame's first 8 bytes.
+int32_t mpeg_backstep(const mpeg_header *h, const uint8_t *p);
+
+// Whether a stream's first frame carries an encoder's table (Xing, Info, VBRI) in place of music. p
+// holds the frame, bytes of it.
+bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
+
+#endif

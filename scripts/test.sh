@@ -1,0 +1,28 @@
+#!/usr/bin/env bash
+# scripts/test.sh
+# Sets up, builds, checks the formatting and runs every test in the release and under the
+# sanitizers. Ends with CTest's summary; fails when any of it does.
+set -euo pipefail
+cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
+
+bash scripts/setup.sh
+
+echo "== formatting"
+sources=$(git ls-files '*.cpp' '*.h' '*.c' 2>/dev/null) || sources=""
+[[ -n $sources ]] || sources=$(find . -path ./build -prune -o -name '*.cpp' -print -o -name '*.[ch]' -print)
+xargs -d '\n' clang-format --dry-run --Werror <<<"$sources"
+
+failed=()
+for preset in release asan tsan; do
+  echo "== $preset: build"
+  cmake --preset "$preset" >/dev/null
+  cmake --build --preset "$preset"
+done
+for preset in release asan tsan; do
+  echo "== $preset: tests"
+  ctest --preset "$preset" || failed+=("$preset")
+done
+if [[ ${#failed[@]} -gt 0 ]]; then
+  echo "tests failed in: ${failed[*]}" >&2
+  exit 1
+fi
