@@ -1,0 +1,137 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+
+#include "beat/candidates.h"
+#include "tests/beat/beat_fixture.h"
+
+namespace {
+
+// An envelope set up by hand. Three values at least as high must lie in the window around a peak
+// before the 97th percentile keeps it out: a plateau does that, and is no peak itself.
+struct envelope : working_context {
+    envelope(int64_t frames, int32_t bpm) : working_context(frames) { of.ctx.onset->bpm = bpm; }
+
+    void peak(int64_t frame, double height) { beat.onset_env[frame] = height; }
+    void kept_out(int64_t frame, double height) {
+        peak(frame, height);
+        std::fill(beat.onset_env + frame + 10, beat.onset_env + frame + 15, 10.0);
+    }
+    void rises(const std::vector<int32_t> &frames) {
+        beat.rise_count = static_cast<int32_t>(frames.size());
+        beat.rise_frames = static_cast<int32_t *>(calloc(frames.size(), sizeof(int32_t)));
+        std::copy(frames.begin(), frames.end(), beat.rise_frames);
+    }
+    // The frames of the peaks behind the beats: a beat lies two hops after its frame's start.
+    std::vector<int64_t> place(int32_t max_beats = 0) {
+        of.ctx.onset->max_beats = max_beats;
+        std::vector<float> out(static_cast<size_t>(beat.frame_count + 50));
+        const int32_t count = getBeatCandi_MT(&beat, of.ctx.onset, out.data());
+        std::vector<int64_t> frames;
+        for (size_t k = 0; k < static_cast<size_t>(count); ++k) {
+            const double hops = static_cast<double>(out[k]) / 1000.0 / kHop;
+            EXPECT_NEAR(hops, std::round(hops), 1e-3);
+            frames.push_back(std::lround(hops) - 2);
+        }
+        return frames;
+    }
+};
+
+using frames = std::vector<int64_t>;
+
+}  // namespace
+
+// 120 BPM: beats at least 43 frames apart, the larger first.
+TEST(Candidates, PeaksAndTheirDistance) {
+    envelope env(1000, 120);
+    for (const int64_t frame : {100, 143, 200, 242, 400}) env.peak(frame, 5.0);
+    env.peak(200, 6.0);
+    env.peak(110, 4.0);
+    EXPECT_EQ(env.place(), (frames{100, 143, 200, 400}));
+    // -1 and 0 mean no limit.
+    EXPECT_EQ(env.place(-1).size(), 4u);
+    EXPECT_EQ(env.place(1), frames{200});
+}
+
+TEST(Candidates, ARiseNeedsNoThreshold) {
+    envelope env(1000, 120);
+    env.peak(100, 20.0);
+    env.kept_out(300, 2.0);
+    env.kept_out(330, 3.0);
+    env.peak(400, 21.0);
+    EXPECT_EQ(env.place(), (frames{100, 330, 400}));  // a gap of 300 frames, over 3 spans
+    env.rises({290, 310});
+    // Both rises take the peak at 300, so the beat appears twice, and 330 lies too close to it.
+    EXPECT_EQ(env.place(), (frames{100, 300, 300, 400}));
+}
+
+// The last peak serves no rise; an ordinary one then takes the place that needs no threshold.
+TEST(Candidates, ARiseThatFindsNoPeak) {
+    envelope env(400, 120);
+    env.kept_out(200, 9.0);
+    env.peak(300, 5.0);
+    EXPECT_EQ(env.place(), frames{300});
+    env.rises({350});
+    EXPECT_EQ(env.place(), (frames{200, 300}));
+}
+
+TEST(Candidates, GapsAreFilled) {
+    envelope env(1000, 120);
+    env.peak(100, 20.0);
+    env.peak(800, 21.0);
+    for (int64_t k = 0; k < 5; ++k) env.kept_out(200 + 100 * k, 1.0 + static_cast<double>(k));
+    EXPECT_EQ(env.place(), (frames{100, 200, 300, 400, 500, 600, 800}));
+    env.kept_out(700, 2.5);  // a sixth: the weakest stays out
+    EXPECT_EQ(env.place(), (frames{100, 300, 400, 500, 600, 700, 800}));
+    EXPECT_EQ(env.place(1), frames{800});  // no gap
+}
+
+// 120 BPM: longer than 3 s, 129.2 frames. 40 BPM: 6 s, 258.4 frames, though three spans are 9 s.
+TEST(Candidates, GapsThatAreLongEnough) {
+    const struct {
+        int32_t bpm;
+        int64_t gap;
+        size_t beats;
+    } cases[] = {{120, 129, 2}, {120, 130, 3}, {40, 258, 2}, {40, 259, 3}};
+    for (const auto &c : cases) {
+        envelope env(1200, c.bpm);
+        const int64_t start = 300;
+        const int64_t middle = c.bpm == 40 ? start + 129 : start + 50;
+        env.peak(start, 20.0);
+        // Enough plateaus for the slow tempo's longer window (third, eighth largest).
+        env.kept_out(middle, 2.0);
+        std::fill(env.beat.onset_env + middle + 20, env.beat.onset_env + middle + 29, 10.0);
+        env.peak(start + c.gap, 21.0);
+        EXPECT_EQ(env.place().size(), c.beats) << c.bpm << " BPM, gap " << c.gap;
+    }
+}
+
+// Five fit each gap. Nine gaps have 45, not more than 45, so a tenth is filled and no eleventh.
+TEST(Candidates, FiftyAreAddedAtMost) {
+    envelope env(4300, 120);
+    for (int64_t k = 0; k <= 12; ++k) {
+        const int64_t start = 100 + 320 * k;
+        env.peak(start, 20.0 + static_cast<double>(k));
+        for (int64_t t = 1; t <= 5 && k < 12; ++t) {
+            env.kept_out(start + 48 * t,
+                         1.0 + static_cast<double>(t) / 8 + static_cast<double>(k) / 99);
+        }
+    }
+    EXPECT_EQ(env.place().size(), 13u + 50u);
+    EXPECT_EQ(env.place(11).size(), 11u + 50u);
+    EXPECT_EQ(env.place(3).size(), 3u + 10u);
+}
+
+TEST(Candidates, NothingToPlace) {
+    const struct {
+        int64_t frames;
+        int32_t bpm;
+        double value;
+    } cases[] = {{500, 90, NAN}, {500, 90, INFINITY}, {500, 90, 1.0}, {1, 90, 0.0}, {500, 0, 0.0}};
+    for (const auto &c : cases) {
+        envelope env(c.frames, c.bpm);
+        std::fill(env.beat.onset_env, env.beat.onset_env + c.frames - 1, c.value);
+        if (c.value == 0.0 && c.frames > 1) env.peak(100, 5.0);
+        EXPECT_EQ(env.place(), frames{}) << c.frames << ' ' << c.bpm << ' ' << c.value;
+    }
+}

@@ -1,0 +1,153 @@
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <fstream>
+#include <iterator>
+#include <string>
+
+#include "beat/click_track.h"
+#include "tests/beat/beat_fixture.h"
+
+namespace {
+
+constexpr int kBlip = 1102;  // samples, 100 ms
+
+using bytes = std::vector<uint8_t>;
+
+std::string temporary_path() {
+    return testing::TempDir() + "click_" + std::to_string(getpid()) + ".wav";
+}
+
+bytes read_file(const std::string &path) {
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
+}
+
+std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
+    std::vector<float> track(static_cast<size_t>(n));
+    makeBlipTrack(beats.data(), static_cast<int32_t>(beats.size()), 11025, n, track.data());
+    return track;
+}
+
+int sample_at(const bytes &file, size_t i) {
+    return static_cast<int16_t>(file[44 + 2 * i] | file[45 + 2 * i] << 8);
+}
+
+}  // namespace
+
+TEST(ClickTrack, Header) {
+    const struct {
+        uint32_t n;
+        bytes riff, data;
+    } cases[] = {{1000, {0xF4, 0x07, 0, 0}, {0xD0, 0x07, 0, 0}},  // 2036, 2000
+                 {0, {36, 0, 0, 0}, {0, 0, 0, 0}},
+                 {0xFFFFFFFF, {34, 0, 0, 0}, {0xFE, 0xFF, 0xFF, 0xFF}}};  // 32 bits wrap
+    for (const auto &c : cases) {
+        char buffer[64] = {};
+        FILE *stream = fmemopen(buffer, sizeof buffer, "wb");
+        EXPECT_EQ(makeWaveHeader(c.n, stream), 1);
+        EXPECT_EQ(ftell(stream), 44);
+        fclose(stream);
+        bytes expected = {'R', 'I', 'F', 'F'};
+        expected.insert(expected.end(), c.riff.begin(), c.riff.end());
+        const bytes middle = {'W', 'A', 'V', 'E', 'f', 'm',  't',  ' ', 16,  0,    0,
+                              0,   1,   0,   1,   0,   0x11, 0x2B, 0,   0,   0x22, 0x56,
+                              0,   0,   2,   0,   16,  0,    'd',  'a', 't', 'a'};
+        expected.insert(expected.end(), middle.begin(), middle.end());
+        expected.insert(expected.end(), c.data.begin(), c.data.end());
+        EXPECT_EQ(bytes(buffer, buffer + 44), expected);
+    }
+}
+
+// i e^(-i/110) cos(2 pi 4000 i / 11025) / 160.
+TEST(ClickTrack, BlipIsPlacedAtTheNearestSample) {
+    const std::vector<float> track = track_of({1000.04f}, 20000);  // sample 11025.44
+    EXPECT_EQ(track[11024], 0.0f);
+    EXPECT_EQ(track[11025], 0.0f);
+    EXPECT_NEAR(track[11026], -0.0040316, 1e-6);
+    EXPECT_NEAR(track[11027], -0.0018710, 2e-6);
+    float top = 0.0f;
+    for (int i = 0; i < kBlip; ++i)
+        top = std::max(top, std::fabs(track[11025 + static_cast<size_t>(i)]));
+    EXPECT_NEAR(top, 0.253, 0.002);
+    EXPECT_NE(track[11025 + kBlip - 1], 0.0f);
+    EXPECT_EQ(track[11025 + kBlip], 0.0f);
+}
+
+// 50 ms are 551.25 samples: the second blip begins at 1654 and ends the first.
+TEST(ClickTrack, LaterBlipReplacesTheTail) {
+    const std::vector<float> one = track_of({100.0f}, 5000);
+    const std::vector<float> two = track_of({100.0f, 150.0f}, 5000);
+    for (size_t i = 0; i < 5000; ++i) {
+        const float expected = i < 1654 ? one[i] : i < 1654 + kBlip ? one[i - 551] : 0.0f;
+        ASSERT_EQ(two[i], expected) << i;
+    }
+}
+
+// A blip cut short ends one sample before the end; beats at the end or past it add nothing.
+TEST(ClickTrack, AtTheEnd) {
+    const std::vector<float> whole = track_of({100.0f}, 5000);
+    const struct {
+        int64_t n;
+        size_t length;
+    } cases[] = {{1103 + kBlip, kBlip},
+                 {1103 + kBlip - 1, kBlip - 2},
+                 {1105, 1},
+                 {1104, 0},
+                 {1103, 0},
+                 {1000, 0},
+                 {0, 0}};
+    for (const auto &c : cases) {
+        const std::vector<float> track = track_of({100.0f, 200.0f, 1e9f}, c.n);
+        for (size_t i = 0; i < track.size() && i < 2205; ++i) {
+            const bool in_blip = i >= 1103 && i < 1103 + c.length;
+            ASSERT_EQ(track[i], in_blip ? whole[i] : 0.0f) << c.n << " samples, " << i;
+        }
+    }
+}
+
+TEST(ClickTrack, FileHoldsHalfTheSignalAndTheBlips) {
+    const std::string path = temporary_path();
+    analysis of(drum_song(120, 12));
+    fnamedec = path.c_str();
+    const int32_t count = getBeatPosition(&of.ctx);
+    fnamedec = "";
+    ASSERT_GT(count, 2);
+    const bytes file = read_file(path);
+    unlink(path.c_str());
+
+    const std::vector<float> track = track_of(of.beats(), of.ctx.ana_len);
+    ASSERT_EQ(file.size(), 44 + 2 * of.ana.size());
+    for (size_t i = 0; i < of.ana.size(); ++i) {
+        const double blip = 2.5 * 32767.0 * static_cast<double>(track[i]);
+        ASSERT_NEAR(sample_at(file, i), (of.ana[i] + blip) / 2, 1.0) << i;
+    }
+}
+
+// Whatever the length; 1001 and -1001 halve towards zero.
+TEST(ClickTrack, WithoutBeatsHalfTheSignalAlone) {
+    for (const size_t n : {size_t{0}, size_t{300}, size_t{11025}}) {
+        const std::string path = temporary_path();
+        std::vector<double> samples(n, 1001.0);
+        if (n > 0) samples[1] = -1001.0;
+        analysis of(samples);
+        fnamedec = path.c_str();
+        EXPECT_EQ(getBeatPosition(&of.ctx), 0);
+        fnamedec = "";
+        EXPECT_EQ(of.ctx.state, kStateFinished);
+        const bytes file = read_file(path);
+        unlink(path.c_str());
+        ASSERT_EQ(file.size(), 44 + 2 * n);
+        for (size_t i = 0; i < n; ++i) ASSERT_EQ(sample_at(file, i), i == 1 ? -500 : 500);
+    }
+}
+
+TEST(ClickTrack, NoFileNoHarm) {
+    for (const char *path : {"", "/nowhere/at/all.wav", static_cast<const char *>(nullptr)}) {
+        analysis of(drum_song(120, 6));
+        fnamedec = path;
+        EXPECT_GT(getBeatPosition(&of.ctx), 0);
+        EXPECT_EQ(of.ctx.state, kStateFinished);
+        fnamedec = "";
+    }
+}

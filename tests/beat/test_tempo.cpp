@@ -1,0 +1,68 @@
+#include <gtest/gtest.h>
+
+#include "beat/tempo.h"
+#include "tests/beat/beat_fixture.h"
+
+namespace {
+
+constexpr int32_t kLags = 86;  // two seconds
+
+std::vector<double> pulses(size_t length, size_t period) {
+    std::vector<double> x(length);
+    for (size_t i = 0; i < length; i += period) x[i] = 1.0;
+    return x;
+}
+
+}  // namespace
+
+// Frames to BPM: 2583.984375 / period. With pulses every p frames the correlation at p and 2p is
+// nearly the same, so the prior decides: p up to about 144 BPM, else 2p.
+TEST(Tempo, Pulses) {
+    const struct {
+        size_t length;
+        int64_t nfft;
+        size_t period;
+        int32_t bpm;
+    } cases[] = {
+        {2584, 4096, 20, 129},  // weights 0.994 and 0.671: share 0.599
+        {2584, 4096, 13, 99},   // 198.77 BPM, weights 0.767 and 0.964: share 0.444, 26 frames
+        {2584, 4096, 26, 99},   // weights 0.964 and 0.445
+        {2584, 4096, 42, 61},   // the longest period looked at
+        {2584, 4096, 44, 58},   // found as the double of 22, where nothing is
+        {1290, 2048, 20, 129},  // half a minute
+        {42, 64, 20, 129},      // a second: more lags than the transform has values
+        {10, 16, 4, 80},        // the circle of 16 correlates best; 161 BPM, so 32 frames
+    };
+    for (const auto &c : cases) {
+        const std::vector<double> x = pulses(c.length, c.period);
+        EXPECT_EQ(calc_bpm_acf(x.data(), c.nfft, kLags, static_cast<int32_t>(c.length), kHop),
+                  c.bpm)
+            << c.length << " frames, period " << c.period;
+    }
+}
+
+// Two pulses alone correlate at one lag only; 60 / (12 hops) = 215.33.
+TEST(Tempo, TwoPulses) {
+    std::vector<double> x(2584);
+    x[100] = x[112] = 1.0;
+    EXPECT_EQ(calc_bpm_acf(x.data(), 4096, kLags, 2584, kHop), 215);
+}
+
+TEST(Tempo, NoPeriodCountsAsAboveEveryTempo) {
+    std::vector<double> x(64);
+    EXPECT_GT(calc_bpm_acf(x.data(), 64, kLags, 64, kHop), 200);
+    EXPECT_GT(calc_bpm_acf(x.data(), 64, 3, 64, kHop), 200);
+    x[5] = NAN;
+    EXPECT_GT(calc_bpm_acf(x.data(), 64, kLags, 64, kHop), 200);
+    x[5] = INFINITY;
+    EXPECT_GT(calc_bpm_acf(x.data(), 64, kLags, 64, kHop), 200);
+}
+
+// Two clicks 12 frames apart and nothing else: above 200, so 90 is stored.
+TEST(Tempo, AboveTwoHundredIsNinety) {
+    std::vector<double> samples(8 * 11025);
+    samples[20000] = samples[20000 + 12 * 256] = 32767.0;
+    analysis of(samples);
+    getBeatPosition(&of.ctx);
+    EXPECT_EQ(of.ctx.onset->bpm, 90);
+}

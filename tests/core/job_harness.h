@@ -1,0 +1,72 @@
+// Runs jobs in tests: a callback that counts and copies what it gets, and can be held up.
+#ifndef TAVO_TESTS_CORE_JOB_HARNESS_H
+#define TAVO_TESTS_CORE_JOB_HARNESS_H
+
+#include <condition_variable>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "core/tavo_ctx.h"
+
+namespace job {
+
+struct result {
+    int calls = 0;
+    int32_t hl_pos = -1;
+    int32_t beat_count = -1;
+    int32_t status = -2;
+    bool null_beats = false;
+    std::vector<float> beats;
+};
+
+inline std::mutex lock;
+inline std::condition_variable changed;
+inline result last;
+inline bool hold = false;                      // the callback waits while this is set
+inline void (*inside)(TAVO_INFO *) = nullptr;  // called in the callback
+
+inline void callback(TAVO_INFO *info) {
+    if (inside != nullptr) inside(info);
+    std::unique_lock<std::mutex> guard(lock);
+    ++last.calls;
+    last.hl_pos = info->hl_pos;
+    last.beat_count = info->beat_count;
+    last.status = info->status;
+    last.null_beats = info->beat_times == nullptr;
+    last.beats.assign(info->beat_times, info->beat_times + info->beat_count);
+    changed.notify_all();
+    changed.wait(guard, [] { return !hold; });
+}
+
+inline void expect_none() {
+    std::lock_guard<std::mutex> guard(lock);
+    last = result{};
+    hold = false;
+    inside = nullptr;
+}
+
+inline result wait() {
+    std::unique_lock<std::mutex> guard(lock);
+    changed.wait(guard, [] { return last.calls > 0; });
+    return last;
+}
+
+inline void release() {
+    std::lock_guard<std::mutex> guard(lock);
+    hold = false;
+    changed.notify_all();
+}
+
+inline TAVO_CTX *create(const std::string &path, int32_t mode, int32_t *err) {
+    expect_none();
+    fnamedec = "";
+    const TAVO_PARAM param = {path.c_str(), mode};
+    TAVO_CTX *ctx = tavo_init(&param, err);
+    if (ctx != nullptr) tavo_setcallback(ctx, callback);
+    return ctx;
+}
+
+}  // namespace job
+
+#endif

@@ -1,0 +1,211 @@
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <cstring>
+#include <thread>
+
+#include "core/lifecycle.h"
+#include "job_harness.h"
+#include "media_source/mtsrc_ctx.h"
+#include "pcm/decode.h"
+#include "tests/support/song.h"
+
+namespace {
+
+constexpr int32_t kModes[] = {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH};
+
+// One song for all cases: 24 s at 120 BPM, loud from 8 s on.
+const std::string &song_path() {
+    static const std::string path = [] {
+        support::song_spec spec;
+        spec.seconds = 24.0;
+        spec.rate = 22050;
+        spec.loud_at = 8.0;
+        spec.tail_at = 22.0;
+        const std::string name = testing::TempDir() + "tavo_lifecycle.wav";
+        EXPECT_TRUE(support::write_wav(name, support::make_song(spec)));
+        return name;
+    }();
+    return path;
+}
+
+std::string wav_of_samples(const char *name, int32_t rate, size_t samples) {
+    support::wav_spec spec;
+    spec.rate = rate;
+    spec.channels = 1;
+    const std::string path = testing::TempDir() + name;
+    EXPECT_TRUE(support::write_bytes(
+        path, support::wav_bytes(std::vector<int16_t>(samples, int16_t{100}), spec)));
+    return path;
+}
+
+TEST(Lifecycle, CreationMakesWhatTheModeNeeds) {
+    for (int32_t mode : kModes) {
+        int32_t err = 99;
+        TAVO_CTX *ctx = job::create(song_path(), mode, &err);
+        ASSERT_NE(ctx, nullptr);
+        EXPECT_EQ(err, 0);
+        EXPECT_EQ(memcmp(ctx, "ZEKA", 4), 0);
+        EXPECT_EQ(ctx->state, 1);
+        EXPECT_EQ(ctx->ana_rate, mode == TAVO_MODE_HIGHLIGHT ? 0 : 11025);
+        EXPECT_EQ(ctx->hl != nullptr, mode != TAVO_MODE_BEATS);
+        EXPECT_EQ(ctx->onset != nullptr, mode != TAVO_MODE_HIGHLIGHT);
+        if (ctx->onset != nullptr) {
+            EXPECT_EQ(ctx->onset->frame_size, 512);
+            EXPECT_EQ(ctx->onset->hop_size, 256);
+        }
+        EXPECT_EQ(ctx->seg_count, 4);
+        EXPECT_EQ(ctx->duration, 240'000'000);
+        EXPECT_EQ(tavo_deinit(ctx), 0);
+        EXPECT_EQ(job::last.calls, 0);
+    }
+}
+
+TEST(Lifecycle, UnusableFilesAreOneCode) {
+    const std::string cases[] = {
+        testing::TempDir() + "tavo_missing.wav",
+        testing::TempDir(),
+        wav_of_samples("tavo_one_second.wav", 8000, 8000),
+        wav_of_samples("tavo_7999.wav", 7999, 80000),
+    };
+    for (const std::string &path : cases) {
+        for (int32_t mode : kModes) {
+            int32_t err = 99;
+            EXPECT_EQ(job::create(path, mode, &err), nullptr) << path;
+            EXPECT_EQ(err, -4) << path;
+        }
+    }
+    int32_t err = 99;
+    TAVO_CTX *ctx = job::create(wav_of_samples("tavo_8001.wav", 8000, 8001), 0, &err);
+    ASSERT_NE(ctx, nullptr);
+    EXPECT_EQ(ctx->seg_count, 1);
+    EXPECT_EQ(tavo_deinit(ctx), 0);
+}
+
+TEST(Lifecycle, BadHandlesTouchNothing) {
+    TAVO_CTX wrong{};
+    memcpy(wrong.magic, "KOVA", 4);
+    wrong.state = 1;
+    for (TAVO_CTX *ctx : {static_cast<TAVO_CTX *>(nullptr), &wrong}) {
+        EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -4);
+        EXPECT_EQ(_tavo_quit(ctx), -4);
+        EXPECT_EQ(tavo_deinit(ctx), -4);
+    }
+    EXPECT_EQ(wrong.state, 1);
+    EXPECT_EQ(wrong.quit, 0);
+}
+
+TEST(Lifecycle, UnknownModeStartsNothing) {
+    int32_t err = 99;
+    for (int32_t mode : {-1, 3}) {
+        TAVO_CTX *ctx = job::create(song_path(), mode, &err);
+        ASSERT_NE(ctx, nullptr);
+        EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -4);
+        EXPECT_EQ(ctx->state, 1);
+        EXPECT_EQ(tavo_deinit(ctx), 0);
+    }
+}
+
+TEST(Lifecycle, SecondStartIsRefusedWhileRunningAndAfter) {
+    for (int32_t mode : kModes) {
+        int32_t err = 99;
+        TAVO_CTX *ctx = job::create(song_path(), mode, &err);
+        ASSERT_NE(ctx, nullptr);
+        job::hold = true;
+        ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+        EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -5);
+        job::wait();
+        EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -5);
+        job::release();
+        EXPECT_EQ(tavo_deinit(ctx), 0);
+        EXPECT_EQ(job::last.calls, 1);
+        EXPECT_EQ(job::last.status, 0);
+    }
+}
+
+// Stops at many moments of a job: each gives exactly one callback before tavo_deinit returns.
+TEST(Lifecycle, StopAtAnyMomentReportsOnce) {
+    for (int32_t mode : kModes) {
+        for (int delay_us : {0, 200, 1000, 3000, 10000, 30000, 100000}) {
+            int32_t err = 99;
+            TAVO_CTX *ctx = job::create(song_path(), mode, &err);
+            ASSERT_NE(ctx, nullptr);
+            ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+            std::this_thread::sleep_for(std::chrono::microseconds(delay_us));
+            EXPECT_EQ(tavo_deinit(ctx), 0);
+            EXPECT_EQ(job::last.calls, 1);
+            if (mode == TAVO_MODE_HIGHLIGHT) {
+                EXPECT_EQ(job::last.status, 0);
+            } else if (job::last.status != 0) {
+                EXPECT_EQ(job::last.status, -1);
+                EXPECT_EQ(job::last.beat_count, 0);
+                EXPECT_TRUE(job::last.null_beats);
+            }
+        }
+    }
+}
+
+const TAVO_CTX *gated = nullptr;
+int32_t (*read_behind_gate)(mtsrc_ctx *, int32_t, mtsrc_frame *) = nullptr;
+
+int32_t read_once_stopped(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
+    while (load_flag(&gated->quit) == 0) std::this_thread::yield();
+    return read_behind_gate(src, want, frame);
+}
+
+// A stop that arrives while decoding waits for it, then costs the beats but not the highlight.
+TEST(Lifecycle, StopDuringDecodingEndsBeforeTheBeats) {
+    for (int32_t mode : kModes) {
+        int32_t err = 99;
+        TAVO_CTX *ctx = job::create(song_path(), mode, &err);
+        ASSERT_NE(ctx, nullptr);
+        gated = ctx;
+        read_behind_gate = ctx->seg[0].src->get_frm;
+        for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].src->get_frm = read_once_stopped;
+        ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+        EXPECT_EQ(tavo_deinit(ctx), 0);
+        EXPECT_EQ(job::last.calls, 1);
+        EXPECT_EQ(job::last.status, mode == TAVO_MODE_HIGHLIGHT ? 0 : -1);
+        EXPECT_EQ(job::last.beat_count, 0);
+        EXPECT_TRUE(job::last.null_beats);
+    }
+}
+
+// The final state is set before the callback: a stop may come while it still runs, and waits for
+// it.
+TEST(Lifecycle, ReleaseWaitsForTheCallback) {
+    int32_t err = 99;
+    TAVO_CTX *ctx = job::create(song_path(), TAVO_MODE_HIGHLIGHT, &err);
+    ASSERT_NE(ctx, nullptr);
+    job::hold = true;
+    ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+    job::wait();
+    EXPECT_EQ(load_flag(&ctx->state), 3);
+    bool released = false;
+    std::thread releaser([&released] {
+        std::this_thread::sleep_for(std::chrono::milliseconds(30));
+        released = true;
+        job::release();
+    });
+    EXPECT_EQ(tavo_deinit(ctx), 0);
+    releaser.join();
+    EXPECT_TRUE(released);
+}
+
+TAVO_CTX *own_instance = nullptr;
+int32_t answer_inside = 99;
+
+TEST(Lifecycle, ReleaseFromInsideTheCallbackIsRefused) {
+    for (int32_t mode : kModes) {
+        int32_t err = 99;
+        own_instance = job::create(song_path(), mode, &err);
+        ASSERT_NE(own_instance, nullptr);
+        job::inside = [](TAVO_INFO *) { answer_inside = tavo_deinit(own_instance); };
+        ASSERT_EQ(tavo_analyze(own_instance, 0, 0, 0), 0);
+        EXPECT_EQ(job::wait().status, 0);
+        EXPECT_EQ(answer_inside, -4);
+        EXPECT_EQ(tavo_deinit(own_instance), 0);
+    }
+}
+
+}  // namespace

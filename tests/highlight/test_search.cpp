@@ -1,0 +1,154 @@
+#include <gtest/gtest.h>
+
+#include <vector>
+
+#include "highlight/search.h"
+
+namespace {
+
+// Envelopes of 60 points (2 s each) and a largest value of 1: the normalised values are these. From
+// 90 s on, edges count from point 9 on and up to point 60 - 25 = 35; below, from 0 to 50.
+struct RUN {
+    int count;
+    float value;
+};
+
+std::vector<float> runs(const std::vector<RUN> &list) {
+    std::vector<float> power;
+    for (const RUN &run : list)
+        power.insert(power.end(), static_cast<size_t>(run.count), run.value);
+    return power;
+}
+
+uint32_t search(std::vector<float> power, int32_t duration_s, int32_t hl_param = 0) {
+    TAVO_HL_CTX hl = {};
+    hl.hl_param = hl_param;
+    hl.power = power.data();
+    hl.power_count = static_cast<int32_t>(power.size());
+    return _get_HL_simple(&hl, duration_s);
+}
+
+TEST(Search, TheRiseIntoTheLoudPassage) {
+    const auto song = runs({{20, 0.4f}, {10, 0.9f}, {1, 1.0f}, {19, 0.9f}, {10, 0.4f}});
+    ASSERT_EQ(song.size(), 60u);
+    EXPECT_EQ(search(song, 120), 38000u);
+}
+
+TEST(Search, ScalesWithTheLargestValue) {
+    auto song = runs({{20, 0.4f}, {10, 0.9f}, {1, 1.0f}, {19, 0.9f}, {10, 0.4f}});
+    for (float &value : song) value *= 0.125f;
+    EXPECT_EQ(search(song, 120), 38000u);
+}
+
+// Edge at 14: 0.1 to 0.45 in one step, score 0.35 + 0.35. Edge at 28: a smaller step, 0.3, but from
+// 0.225 on average to 0.65, score 0.425 + 0.3.
+TEST(Search, ASmallerStepWithTheBetterScoreWins) {
+    const auto song = runs({{3, 0.1f},
+                            {1, 1.0f},
+                            {11, 0.1f},
+                            {6, 0.45f},
+                            {7, 0.1f},
+                            {1, 0.35f},
+                            {12, 0.65f},
+                            {19, 0.1f}});
+    ASSERT_EQ(song.size(), 60u);
+    EXPECT_EQ(search(song, 120), 56000u);
+}
+
+// Edge at 13: 0.5625 + 0.4375. Edge at 30: 0.5 + 0.5. All exact in binary.
+TEST(Search, OfEqualScoresTheLargerStepWins) {
+    const auto song = runs({{3, 0.125f},
+                            {1, 1.0f},
+                            {9, 0.125f},
+                            {1, 0.375f},
+                            {7, 0.8125f},
+                            {10, 0.25f},
+                            {10, 0.75f},
+                            {19, 0.25f}});
+    ASSERT_EQ(song.size(), 60u);
+    EXPECT_EQ(search(song, 120), 60000u);
+}
+
+TEST(Search, TheOpeningCountsInShortSongsOnly) {
+    const auto song = runs({{5, 0.25f}, {10, 1.0f}, {16, 0.25f}, {10, 0.75f}, {19, 0.25f}});
+    ASSERT_EQ(song.size(), 60u);
+    EXPECT_EQ(search(song, 180), 60000u);
+    EXPECT_EQ(search(song, 90), 60000u);
+    EXPECT_EQ(search(song, 89), 8000u);
+}
+
+// At the last scored point the edge itself is the answer; one later it is the point after the edge,
+// as the last edge left when none passes.
+TEST(Search, TheEndIsNotScored) {
+    for (int rise : {35, 36}) {
+        const auto song = runs({{rise + 1, 0.25f}, {10, 1.0f}, {49 - rise, 0.25f}});
+        ASSERT_EQ(song.size(), 60u);
+        EXPECT_EQ(search(song, 90), rise == 35 ? 70000u : 74000u);
+        EXPECT_EQ(search(song, 89), rise == 35 ? 70000u : 72000u);
+    }
+}
+
+// Bursts of two points are too short to be scored: the first edge that no valley follows closely is
+// taken, at the point after it. Dips below 0.336 are low points; the valley is the last of them.
+TEST(Search, WithoutAScoreAValleyNearTheEdgeRulesItOut) {
+    const std::vector<RUN> end = {{4, 0.5f}, {2, 0.85f}, {28, 0.5f}};
+    std::vector<RUN> near = {{20, 0.5f}, {1, 1.0f}, {1, 0.9f}, {1, 0.3f},
+                             {1, 0.1f},  {1, 0.4f}, {1, 0.5f}};
+    near.insert(near.end(), end.begin(), end.end());
+    ASSERT_EQ(runs(near).size(), 60u);
+    EXPECT_EQ(search(runs(near), 120), 60000u);  // the valley at 23 is 3 after 20
+
+    std::vector<RUN> far = {{20, 0.5f}, {1, 1.0f}, {1, 0.9f}, {1, 0.5f},
+                            {1, 0.3f},  {1, 0.1f}, {1, 0.4f}};
+    far.insert(far.end(), end.begin(), end.end());
+    ASSERT_EQ(runs(far).size(), 60u);
+    EXPECT_EQ(search(runs(far), 120), 40000u);  // at 24 it is 4 after
+}
+
+TEST(Search, ASongLoudFromItsFirstPointHasASegmentThere) {
+    // One edge, at 5, inside the loud passage that is open from the start; the later rise has no
+    // strict maximum. Without the segment the answer would be the point after the edge.
+    const auto song =
+        runs({{6, 0.75f}, {24, 1.0f}, {11, 0.25f}, {1, 0.5f}, {1, 0.75f}, {8, 0.875f}, {9, 0.25f}});
+    ASSERT_EQ(song.size(), 60u);
+    EXPECT_EQ(search(song, 80), 10000u);
+}
+
+TEST(Search, NoRisingEdge) {
+    std::vector<float> falling;
+    for (int k = 0; k < 60; k++) falling.push_back(1.0f - static_cast<float>(k) / 64.0f);
+    EXPECT_EQ(search(falling, 120), 0u);
+    EXPECT_EQ(search(std::vector<float>(60, 1.0f), 120), 0u);
+}
+
+TEST(Search, TooLittleOrNothing) {
+    auto song = runs({{11, 0.25f}, {2, 1.0f}});
+    EXPECT_EQ(search(song, 100), 0u);  // 13 points, 9 skipped
+    EXPECT_EQ(search(std::vector<float>(60, 0.0f), 120), 0u);
+    TAVO_HL_CTX empty = {};
+    EXPECT_EQ(_get_HL_simple(&empty, 120), 0u);
+    // One point more is enough: its only edge, at 11, is not scored and gives the point after.
+    song = runs({{12, 0.25f}, {2, 1.0f}});
+    EXPECT_EQ(search(song, 100), 24000u);
+}
+
+// Segments (9, 13) and (29, 49), no valleys; the edge at 29 is chosen and the region ends at 49,
+// 20 points on.
+TEST(Search, ARequestedLengthMovesTheStart) {
+    const auto song = runs({{10, 0.25f}, {4, 0.75f}, {16, 0.25f}, {20, 1.0f}, {10, 0.25f}});
+    ASSERT_EQ(song.size(), 60u);
+    const struct {
+        int32_t hl_param;
+        uint32_t ms;
+    } cases[] = {
+        {0, 58000},   {-30, 58000}, {44, 58000},  // 22 points reach back 2: not worth moving
+        {46, 58000},                              // ideal 26: 29 is the nearest boundary
+        {60, 26000},                              // ideal 19: 13 is
+        {61, 26000},                              // the same number of points
+        {74, 26000},                              // ideal 12
+        {102, 18000},                             // 9 + 51 reaches the end: the first segment
+    };
+    for (const auto &c : cases) EXPECT_EQ(search(song, 120, c.hl_param), c.ms) << c.hl_param;
+}
+
+}  // namespace

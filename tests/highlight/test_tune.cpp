@@ -1,0 +1,77 @@
+#include <gtest/gtest.h>
+
+#include <vector>
+
+#include "highlight/tune.h"
+#include "level_steps.h"
+
+namespace {
+
+constexpr uint32_t kDuration = 60;  // seconds
+
+// Frames are 1.2 s, one every 0.4 s from 3 s before the start: 27 of them over 29 steps of 0.4 s.
+// squares: mean square of each step from the first frame on, the last one repeated.
+std::vector<int16_t> steps(int32_t rate, int64_t silent_ms, const std::vector<double> &squares) {
+    std::vector<int16_t> pcm;
+    add_level(&pcm, silent_ms * rate / 1000, 0.0);
+    const int64_t step = static_cast<int64_t>(0.4 * rate);
+    for (size_t k = 0; k < 30; k++) {
+        add_level(&pcm, step, k < squares.size() ? squares[k] : squares.back());
+    }
+    return pcm;
+}
+
+std::vector<double> silence_then(const std::vector<double> &squares) {
+    std::vector<double> all(13, 0.0);
+    all.insert(all.end(), squares.begin(), squares.end());
+    return all;
+}
+
+TEST(Tune, StartsThatAreLeftAlone) {
+    const int32_t rate = 8000;
+    EXPECT_EQ(_tune_HL_simple(nullptr, rate, 0, kDuration), 0u);
+    EXPECT_EQ(_tune_HL_simple(nullptr, rate, 2000, kDuration), 2000u);
+    EXPECT_EQ(_tune_HL_simple(nullptr, rate, 52000, kDuration), 52000u);
+    EXPECT_EQ(_tune_HL_simple(nullptr, rate, 51001, kDuration), 51001u);
+    EXPECT_EQ(_tune_HL_simple(nullptr, rate, 70000, kDuration), 70000u);
+    EXPECT_EQ(_tune_HL_simple(nullptr, 0, 20000, kDuration), 20000u);
+    EXPECT_EQ(_tune_HL_simple(nullptr, 2, 20000, kDuration), 20000u);  // a hop of no sample
+    EXPECT_EQ(_tune_HL_simple(nullptr, -8000, 20000, kDuration), 20000u);
+}
+
+// Frame k covers steps k to k + 2. Mean squares from frame 10 on: 0, 0.2, 0.3, 0.3, 0.2, 0.3, 0.3,
+// 0.2, 0: the largest rise is at 10, the only fall of its five steps leads from 13 to 14.
+TEST(Tune, MovesToTheStepBeforeTheFall) {
+    const auto song = silence_then({0.6, 0.3, 0.0, 0.3, 0.6, 0.0});
+    for (int32_t rate : {8000, 11025, 22051, 44100}) {
+        const std::vector<int16_t> pcm = steps(rate, 17000, song);
+        EXPECT_EQ(_tune_HL_simple(pcm.data(), rate, 20000, kDuration), 22200u) << rate;
+    }
+    const std::vector<int16_t> at_once = steps(8000, 0, song);
+    EXPECT_EQ(_tune_HL_simple(at_once.data(), 8000, 3000, kDuration), 5200u);
+    EXPECT_EQ(_tune_HL_simple(at_once.data(), 8000, 3000, 12), 5200u);  // 9 s left exactly
+    EXPECT_EQ(_tune_HL_simple(at_once.data(), 8000, 3000, 11), 3000u);
+}
+
+// A step to square c: the rise at frame 10 is (c/3 + 2c/3 + 3c) / 5 = 0.8 c on average, about
+// 3.47 c dB; after it the first of the two equal steps of 0, from 13 to 14, is taken.
+TEST(Tune, OnlyRisesAboveTheLeastCount) {
+    std::vector<int16_t> pcm = steps(8000, 0, silence_then({0.045}));
+    EXPECT_EQ(_tune_HL_simple(pcm.data(), 8000, 3000, kDuration), 5200u);
+    pcm = steps(8000, 0, silence_then({0.033}));
+    EXPECT_EQ(_tune_HL_simple(pcm.data(), 8000, 3000, kDuration), 3000u);
+    pcm = steps(8000, 0, {0.5});
+    EXPECT_EQ(_tune_HL_simple(pcm.data(), 8000, 3000, kDuration), 3000u);
+}
+
+// Two equal steps up, with a break between them long enough to give equal rises.
+TEST(Tune, TheFirstOfEqualRises) {
+    const std::vector<double> pulse = {0, 0, 0, 0, 0, 0, 0.5, 0.5, 0.5, 0.5, 0.5, 0, 0, 0, 0, 0, 0};
+    std::vector<double> song = pulse;
+    song.insert(song.end(), pulse.begin() + 5, pulse.end());
+    const std::vector<int16_t> pcm = steps(8000, 0, song);
+    // Rise at frame 3 (steps 3 to 5 silent); after it 4, 5, 6 rise, 6 to 7 and 7 to 8 are level.
+    EXPECT_EQ(_tune_HL_simple(pcm.data(), 8000, 3000, kDuration), 6u * 400u);
+}
+
+}  // namespace

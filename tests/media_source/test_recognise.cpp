@@ -1,0 +1,108 @@
+#include <gtest/gtest.h>
+
+#include "tests/media_source/memory_file.h"
+
+namespace {
+
+constexpr int64_t kBefore = 5;  // bytes before the content: recognition starts at any offset
+
+int32_t type_of(const byte_run &content) {
+    const mtsrc_io io = memory_io();
+    memory_file memory;
+    memory.bytes = zeros(kBefore) + content;
+    memory.at = kBefore;
+    int32_t type = -1;
+    EXPECT_EQ(mtsrc_get_file_type(&io, &memory.file, &type), 0);
+    EXPECT_EQ(memory.at, kBefore);
+    return type;
+}
+
+byte_run padded(byte_run head) {
+    head.resize(std::max<size_t>(head.size(), 16));
+    return head;
+}
+
+const byte_run kAsf = {0x30, 0x26, 0xB2, 0x75, 0x8E, 0x66, 0xCF, 0x11,
+                       0xA6, 0xD9, 0x00, 0xAA, 0x00, 0x62, 0xCE, 0x6C};
+
+TEST(Recognise, FilesByTheirHeads) {
+    byte_run near_asf = kAsf;
+    near_asf[15] = 0x6D;
+    const byte_run size = {1, 2, 3, 4};
+    struct {
+        const char *name;
+        byte_run content;
+        int32_t type;
+    } const cases[] = {
+        {"asf", kAsf, 2002},
+        {"asf, last byte differs", near_asf, 2199},
+        {"ftyp", padded(size + text("ftyp")), 2000},
+        {"mdat", padded(size + text("mdat")), 2000},
+        {"moov", padded(size + text("moov")), 2000},
+        {"free", padded(size + text("free")), 2199},
+        {"flac", padded(text("fLaC")), 322},
+        {"flac behind a tag", id3(300) + text("fLaC"), 322},
+        {"flac cut off behind a tag", id3(300) + text("fLa"), 2199},
+        {"ogg", padded(text("OggS") + byte_run{0, 2}), 2005},
+        {"ogg, all flags", padded(text("OggS") + byte_run{0, 6}), 2005},
+        {"ogg, flags too large", padded(text("OggS") + byte_run{0, 7}), 2199},
+        {"ogg, version 1", padded(text("OggS") + byte_run{1, 2}), 2199},
+        {"ogg, position not 0", padded(text("OggS") + zeros(9) + byte_run{1}), 2199},
+        {"ogg, serial number", padded(text("OggS") + zeros(10) + byte_run{1}), 2005},
+        {"wav", text("RIFF") + zeros(4) + text("WAVEfmt "), 2006},
+        {"wav with another chunk first", text("RIFF") + zeros(4) + text("WAVELIST"), 2199},
+        {"adif", padded(text("ADIF")), 2007},
+        {"adts, MPEG-4, checksum", padded({0xFF, 0xF0}), 2007},
+        {"adts, MPEG-4", padded({0xFF, 0xF1}), 2007},
+        {"adts, MPEG-2, checksum", padded({0xFF, 0xF8}), 2007},
+        {"adts, MPEG-2", padded({0xFF, 0xF9}), 2007},
+        {"no adts, layer bits", padded({0xFF, 0xF2}), 2199},
+        {"adts behind a tag", id3(130) + byte_run{0xFF, 0xF1, 0, 0, 0, 0, 0}, 2007},
+        {"adts cut off behind a tag", id3(130) + byte_run{0xFF, 0xF1, 0, 0, 0, 0}, 2199},
+        {"mpeg", layer3_pair(), 305},
+        {"mpeg behind a tag", id3(5000) + layer3_pair(), 305},
+        {"nothing", zeros(100), 2199},
+    };
+    for (const auto &one : cases) {
+        EXPECT_EQ(type_of(one.content), one.type) << one.name;
+    }
+}
+
+// The top bits of the four size bytes are not looked at.
+TEST(Recognise, TheTagsLengthIsFourGroupsOfSevenBits) {
+    byte_run tag = id3((1 << 21) + (3 << 14) + (2 << 7) + 5);
+    tag[6] |= 0x80;
+    tag[8] |= 0x80;
+    EXPECT_EQ(type_of(tag + text("fLaC")), 322);
+    EXPECT_EQ(type_of(tag + zeros(1) + text("fLaC")), 2199);
+}
+
+TEST(Recognise, AHeadThatCannotBeReadWholeIsAFailure) {
+    const mtsrc_io io = memory_io();
+    memory_file memory;
+    memory.bytes = zeros(15);
+    int32_t type = 77;
+    EXPECT_EQ(mtsrc_get_file_type(&io, &memory.file, &type), -6);
+    EXPECT_EQ(type, 77);
+    mtsrc_io broken = memory_io();
+    broken.tell = [](mtsrc_file *, int64_t *) { return -1; };
+    memory.bytes = kAsf;
+    memory.at = 0;
+    EXPECT_EQ(mtsrc_get_file_type(&broken, &memory.file, &type), -6);
+    broken = memory_io();
+    broken.seek = [](mtsrc_file *, const int64_t *) { return -1; };
+    EXPECT_EQ(mtsrc_get_file_type(&broken, &memory.file, &type), -6);
+}
+
+TEST(Recognise, AFailedSkipAsksTheNextProbe) {
+    mtsrc_io io = memory_io();
+    io.skip = [](mtsrc_file *, const int64_t *) { return -1; };
+    memory_file memory;
+    memory.bytes = id3(20) + text("fLaC") + zeros(20);
+    int32_t type = 0;
+    EXPECT_EQ(mtsrc_get_file_type(&io, &memory.file, &type), 0);
+    EXPECT_EQ(type, 2199);
+    EXPECT_EQ(memory.at, 0);
+}
+
+}  // namespace

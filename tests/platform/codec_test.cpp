@@ -1,0 +1,218 @@
+#include "tests/platform/codec_test.h"
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <iterator>
+#include <random>
+
+namespace codec_test {
+
+namespace {
+
+constexpr int32_t kRequest = 8192;       // bytes, the pipeline's own
+constexpr size_t kSeamSamples = 30'000;  // compared behind each seek
+constexpr int kSeams = 40;
+constexpr int64_t kUnits = 10'000'000;  // per second
+
+// Files that the running program saved; removed when it ends.
+struct saved_files {
+    std::vector<std::string> paths;
+    ~saved_files() {
+        for (const std::string &path : paths) {
+            unlink(path.c_str());
+        }
+    }
+} saved;
+
+}  // namespace
+
+std::string fixture(const std::string &name) {
+    return std::string(CODEC_FIXTURES) + "/" + name;
+}
+
+bytes load(const std::string &path) {
+    std::ifstream in(path, std::ios::binary);
+    bytes contents{std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+    EXPECT_FALSE(contents.empty()) << path;
+    return contents;
+}
+
+std::string save(const std::string &name, const bytes &contents) {
+    const std::string path = testing::TempDir() + "tavo_" + std::to_string(getpid()) + "_" + name;
+    std::ofstream out(path, std::ios::binary);
+    out.write(reinterpret_cast<const char *>(contents.data()),
+              static_cast<std::streamsize>(contents.size()));
+    EXPECT_TRUE(out.good()) << path;
+    saved.paths.push_back(path);
+    return path;
+}
+
+opened::opened(const std::string &path) {
+    const mtsrc_param param = {path.c_str()};
+    source = mtsrc_init(&param, &error);
+    if (source != nullptr) {
+        EXPECT_EQ(mtsrc_getstream_format(source, &format), 0);
+    }
+}
+
+opened::~opened() {
+    if (source != nullptr) {
+        EXPECT_EQ(mtsrc_deinit(source), -5);
+    }
+}
+
+std::vector<int16_t> read(mtsrc_ctx *source, size_t limit, bool *end) {
+    std::vector<int16_t> samples;
+    std::vector<int16_t> piece(kRequest / 2);
+    bool ended = false;
+    while (!ended && samples.size() < limit) {
+        mtsrc_frame frame = {piece.data(), 0};
+        const int32_t code = mtsrc_getstream(source, kRequest, &frame);
+        if (code != 0 && code != 1) {
+            ADD_FAILURE() << "reading failed with " << code;
+            break;
+        }
+        ended = code == 1;
+        samples.insert(samples.end(), piece.begin(), piece.begin() + frame.size / 2);
+    }
+    samples.resize(std::min(samples.size(), limit));
+    if (end != nullptr) {
+        *end = ended;
+    }
+    return samples;
+}
+
+std::vector<int16_t> read_all(const std::string &path) {
+    opened file(path);
+    EXPECT_NE(file.source, nullptr) << path << ": " << file.error;
+    return file.source != nullptr ? read(file.source, SIZE_MAX) : std::vector<int16_t>{};
+}
+
+void expect_exact_seams(const std::string &path, int64_t longest_frame) {
+    SCOPED_TRACE(path);
+    const std::vector<int16_t> linear = read_all(path);
+    opened file(path);
+    ASSERT_NE(file.source, nullptr) << file.error;
+    ASSERT_GT(linear.size(), 0U);
+    const int64_t rate = file.format.sample_rate;
+    EXPECT_EQ(file.format.duration * rate / kUnits, static_cast<int64_t>(linear.size()));
+    std::mt19937_64 random(7);
+    for (int i = 0; i < kSeams; ++i) {
+        // The stream's edges, then anywhere.
+        const int64_t places[] = {0, 1, file.format.duration - 1, kUnits / 50};
+        const int64_t position =
+            i < 4 ? places[i]
+                  : static_cast<int64_t>(random() % static_cast<uint64_t>(file.format.duration));
+        int64_t reached = -1;
+        ASSERT_EQ(mtsrc_seekstream(file.source, position, &reached), 0);
+        const int64_t sample = reached * rate / kUnits;
+        ASSERT_GE(sample, 0);
+        ASSERT_LT(std::abs(position * rate / kUnits - sample), longest_frame) << position;
+        const std::vector<int16_t> got = read(file.source, kSeamSamples);
+        const size_t left = linear.size() - static_cast<size_t>(sample);
+        ASSERT_EQ(got.size(), std::min(left, kSeamSamples)) << position;
+        const auto differs = std::mismatch(got.begin(), got.end(), linear.begin() + sample);
+        ASSERT_EQ(differs.first - got.begin(), static_cast<ptrdiff_t>(got.size()))
+            << "seek to " << position << ", sample " << sample;
+    }
+}
+
+namespace {
+
+// Flips bits, overwrites runs with noise, zeros or ones, removes and repeats pieces, cuts the end.
+bytes damaged(bytes file, std::mt19937 &random) {
+    const auto below = [&](size_t limit) { return random() % std::max<size_t>(limit, 1); };
+    const size_t wounds = 1 + below(20);
+    const bool head_only = below(3) == 0;
+    for (size_t i = 0; i < wounds && file.size() > 64; ++i) {
+        const size_t at = below(head_only ? 512 : file.size());
+        const size_t run =
+            std::min(1 + below(i % 2 == 0 ? 8 : 4000), file.size() - std::min(at, file.size()));
+        const auto from = file.begin() + static_cast<ptrdiff_t>(std::min(at, file.size()));
+        const auto to = from + static_cast<ptrdiff_t>(run);
+        switch (below(7)) {
+            case 0:
+                std::for_each(from, to,
+                              [&](uint8_t &b) { b = static_cast<uint8_t>(b ^ 1 << below(8)); });
+                break;
+            case 1:
+                std::generate(from, to, [&] { return static_cast<uint8_t>(random()); });
+                break;
+            case 2:
+                std::fill(from, to, uint8_t{0});
+                break;
+            case 3:
+                std::fill(from, to, uint8_t{0xFF});
+                break;
+            case 4:
+                file.erase(from, to);
+                break;
+            case 5: {
+                const bytes piece(from, to);
+                const auto place = file.begin() + static_cast<ptrdiff_t>(below(file.size()));
+                file.insert(place, piece.begin(), piece.end());
+                break;
+            }
+            default:
+                file.resize(file.size() -
+                            std::min(file.size() - 1, below(i == 0 ? file.size() : 64)));
+        }
+    }
+    return file;
+}
+
+}  // namespace
+
+void expect_survives_damage(const std::string &path, int count) {
+    const bytes whole = load(path);
+    std::mt19937 random(static_cast<uint32_t>(whole.size()));
+    int opened_files = 0;
+    for (int i = 0; i < count; ++i) {
+        SCOPED_TRACE(path + " damage " + std::to_string(i));
+        const auto start = std::chrono::steady_clock::now();
+        opened file(save("damaged", damaged(whole, random)));
+        if (file.source == nullptr) {
+            EXPECT_LT(file.error, 0);
+            continue;
+        }
+        ++opened_files;
+        const int64_t rate = file.format.sample_rate;
+        ASSERT_GE(file.format.duration, 0);
+        const std::vector<int16_t> linear = read(file.source, SIZE_MAX);
+        EXPECT_EQ(file.format.duration * rate / kUnits, static_cast<int64_t>(linear.size()));
+        for (int k = 0; k < 4; ++k) {
+            const int64_t position = static_cast<int64_t>(
+                random() % static_cast<uint64_t>(file.format.duration + kUnits));
+            int64_t reached = -1;
+            EXPECT_EQ(mtsrc_seekstream(file.source, position, &reached), 0);
+            EXPECT_GE(reached, 0);
+            EXPECT_LE(reached, std::max(position, file.format.duration));
+            const size_t sample = static_cast<size_t>(reached * rate / kUnits);
+            const std::vector<int16_t> rest = read(file.source, SIZE_MAX);
+            EXPECT_EQ(sample + rest.size(), linear.size());
+        }
+        EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(20));
+    }
+    EXPECT_GT(opened_files, 0);
+}
+
+mtsrc_io io_for(const std::string &path) {
+    mtsrc_io io = {};
+    io.open = mtsrc_file_open;
+    io.close = mtsrc_file_close;
+    io.read = mtsrc_file_read;
+    io.write = mtsrc_file_write;
+    io.tell = mtsrc_file_tell;
+    io.seek = mtsrc_file_seek;
+    io.skip = mtsrc_file_skip;
+    io.size = mtsrc_file_size;
+    io.path = const_cast<char *>(path.c_str());  // read only by open
+    return io;
+}
+
+}  // namespace codec_test

@@ -1,0 +1,60 @@
+// What the codec tests share: encoded files made by tests/support/make_fixtures.sh, media sources
+// read to the end, and the check that a seek lands where it says.
+#ifndef TAVO_TESTS_PLATFORM_CODEC_TEST_H
+#define TAVO_TESTS_PLATFORM_CODEC_TEST_H
+
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "media_source/mtsrc.h"
+
+namespace codec_test {
+
+using bytes = std::vector<uint8_t>;
+
+// Path of a fixture by its name.
+std::string fixture(const std::string &name);
+
+// A file's contents; a missing or empty file fails the test.
+bytes load(const std::string &path);
+
+// Writes contents to a file of the running test's own and returns its path.
+std::string save(const std::string &name, const bytes &contents);
+
+// A source and the path that it reads. source is null when it could not be opened; error says why.
+struct opened {
+    mtsrc_ctx *source = nullptr;
+    int32_t error = 0;
+    mtsrc_format format = {};
+
+    explicit opened(const std::string &path);
+    ~opened();
+    opened(const opened &) = delete;
+    opened &operator=(const opened &) = delete;
+};
+
+// Reads up to limit samples from where the source stands. *end: the source reported the end of the
+// stream. Any failure code fails the test.
+std::vector<int16_t> read(mtsrc_ctx *source, size_t limit, bool *end = nullptr);
+
+// All of a file's samples.
+std::vector<int16_t> read_all(const std::string &path);
+
+// The stream's duration is exact: the samples of a linear read.
+// A seek to each of 40 places reports a place less than longest_frame samples away from it, and
+// delivers from its first sample what a linear read delivers there.
+void expect_exact_seams(const std::string &path, int64_t longest_frame);
+
+// Damages the file in count ways, each with other bytes, and reads every result to its end, with a
+// few seeks: no crash, no hang, and a duration that is the samples' where the file still opens.
+void expect_survives_damage(const std::string &path, int count);
+
+// A callback record for a path, for calling the codec library directly.
+mtsrc_io io_for(const std::string &path);
+
+}  // namespace codec_test
+
+#endif

@@ -1,0 +1,125 @@
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <cerrno>
+
+#include "platform/worker_group.h"
+
+namespace {
+
+int refused_threads = 0;  // bit i: the i-th start of the next four
+int thread_starts = 0;
+
+}  // namespace
+
+extern "C" {
+int __real_pthread_create(pthread_t *, const pthread_attr_t *, void *(*)(void *), void *);
+int __wrap_pthread_create(pthread_t *thread, const pthread_attr_t *attr, void *(*entry)(void *),
+                          void *arg) {
+    const int start = thread_starts++;
+    if (start < 4 && (refused_threads >> start & 1) != 0) return EAGAIN;
+    return __real_pthread_create(thread, attr, entry, arg);
+}
+}
+
+namespace {
+
+struct group;
+
+struct member {
+    group *all;
+    int32_t index;
+    pthread_t thread;
+    pthread_t ran_on;
+    int runs;
+    int stale_flags;  // flags found set although their worker had not run
+};
+
+struct group {
+    pthread_mutex_t *mutex;
+    pthread_cond_t *cond;
+    int32_t done[4];
+    std::atomic<int> finished{0};
+    member members[4];
+};
+
+void work(void *record) {
+    auto *self = static_cast<member *>(record);
+    group *all = self->all;
+    self->ran_on = pthread_self();
+    ++self->runs;
+    pthread_mutex_lock(all->mutex);
+    int set = 0;
+    for (const int32_t flag : all->done) set += flag;
+    if (set > all->finished) self->stale_flags = set - all->finished;
+    if (all->done[self->index] != 0) ++self->stale_flags;
+    ++all->finished;
+    pthread_mutex_unlock(all->mutex);
+}
+
+void report(void *record) {
+    auto *self = static_cast<member *>(record);
+    worker_group_done(self->all->mutex, self->all->cond, self->all->done, 4, self->index);
+}
+
+void *enter(void *record) {
+    pthread_cleanup_push(report, record);
+    work(record);
+    pthread_exit(nullptr);
+    pthread_cleanup_pop(0);
+}
+
+TEST(worker_group, every_worker_runs_once_whatever_can_be_started) {
+    for (int mask = 0; mask < 16; ++mask) {
+        SCOPED_TRACE(mask);
+        group all = {};
+        ASSERT_EQ(worker_lock_create(&all.mutex, &all.cond), 0);
+        worker_slot slots[4];
+        for (int32_t i = 0; i < 4; ++i) {
+            all.members[i].all = &all;
+            all.members[i].index = i;
+            all.done[i] = 1;  // left over from a run before
+            slots[i] = {&all.members[i], &all.members[i].thread, enter, work};
+        }
+        refused_threads = mask;
+        thread_starts = 0;
+        worker_group_run(slots, 4, all.mutex, all.cond, all.done);
+
+        EXPECT_EQ(thread_starts, 4);
+        for (int i = 0; i < 4; ++i) {
+            EXPECT_EQ(all.done[i], 1);
+            EXPECT_EQ(all.members[i].runs, 1);
+            EXPECT_EQ(all.members[i].stale_flags, 0);
+            const bool here = pthread_equal(all.members[i].ran_on, pthread_self()) != 0;
+            EXPECT_EQ(here, (mask >> i & 1) != 0);
+        }
+        worker_lock_release(&all.mutex, &all.cond);
+        EXPECT_EQ(all.mutex, nullptr);
+        EXPECT_EQ(all.cond, nullptr);
+        worker_lock_release(&all.mutex, &all.cond);  // harmless
+    }
+    refused_threads = 0;
+}
+
+TEST(worker_group, many_rounds) {
+    group all = {};
+    ASSERT_EQ(worker_lock_create(&all.mutex, &all.cond), 0);
+    worker_slot slots[4];
+    for (int32_t i = 0; i < 4; ++i) {
+        all.members[i].all = &all;
+        all.members[i].index = i;
+        slots[i] = {&all.members[i], &all.members[i].thread, enter, work};
+    }
+    for (int round = 1; round <= 500; ++round) {
+        all.finished = 0;
+        worker_group_run(slots, 4, all.mutex, all.cond, all.done);
+        ASSERT_EQ(all.finished, 4);
+        for (const auto &each : all.members) {
+            ASSERT_EQ(each.runs, round);
+            ASSERT_EQ(each.stale_flags, 0);
+        }
+    }
+    worker_lock_release(&all.mutex, &all.cond);
+}
+
+}  // namespace

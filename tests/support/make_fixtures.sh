@@ -1,0 +1,91 @@
+#!/bin/sh
+# make_fixtures.sh MAKE_SONG DIR: encodes the synthetic song in every format into DIR, with Debian's
+# encoders. Nothing is done when DIR is complete and newer than this script and MAKE_SONG.
+set -eu
+make_song=$1
+out=$2
+for tool in ffmpeg lame flac metaflac oggenc; do
+  command -v "$tool" >/dev/null || { echo "make_fixtures.sh: $tool is missing" >&2; exit 1; }
+done
+if [ -e "$out/.complete" ] && [ "$out/.complete" -nt "$0" ] && [ "$out/.complete" -nt "$make_song" ]; then
+  exit 0
+fi
+rm -rf "$out"
+mkdir -p "$out"
+cd "$out"
+
+song() { # song FILE OPTIONS...
+  "$make_song" "$@" >/dev/null
+}
+convert() { # convert IN OUT OPTIONS...: by ffmpeg, without marks of its own
+  in=$1 to=$2
+  shift 2
+  ffmpeg -nostdin -v error -y -i "$in" -map_metadata -1 -fflags +bitexact -flags:a +bitexact "$@" "$to"
+}
+
+song song.wav --seconds 12 --loud-at 4
+song mono.wav --seconds 12 --loud-at 4 --channels 1
+song song48.wav --seconds 12 --loud-at 4 --rate 48000
+song song22.wav --seconds 12 --loud-at 4 --rate 22050
+song song96.wav --seconds 6 --loud-at 2 --rate 96000
+song six.wav --seconds 6 --loud-at 2 --channels 6
+
+# MPEG audio
+lame --quiet -b 128 -t song.wav cbr.mp3
+lame --quiet -b 320 -h song48.wav cbr48.mp3
+lame --quiet -V 2 song.wav vbr.mp3
+lame --quiet -V 2 -t song.wav vbr_no_table.mp3
+lame --quiet -b 96 -p -t song.wav checked.mp3
+lame --quiet -b 64 -m m -t mono.wav mono.mp3
+lame --quiet -b 56 -t song22.wav lsf.mp3
+lame --quiet -b 8 -m m --resample 8 -t song.wav low.mp3
+lame --quiet -V 4 --add-id3v2 --tt 'A Title' --ta 'An Artist' --tl 'An Album' --tc 'A comment' \
+  --ty 1999 --tn 3/9 --tg Rock song.wav tagged.mp3
+convert song.wav layer2.mp2 -c:a mp2 -b:a 192k
+
+# FLAC
+flac --totally-silent -5 -o song.flac song.wav
+flac --totally-silent -5 --no-seektable -T 'TITLE=A Title' -T 'ARTIST=An Artist' -T 'KEY=Am' \
+  -o no_table.flac song.wav
+flac --totally-silent -5 --no-seektable -b 1152 -o short_blocks.flac song.wav
+flac --totally-silent -5 --no-seektable -b 4096 -o long_blocks.flac song.wav
+flac --totally-silent --lax -0 -b 65535 --no-seektable -o huge_blocks.flac song.wav
+flac --totally-silent -5 -o mono.flac mono.wav
+flac --totally-silent -5 --channel-map=none -o six.flac six.wav
+convert song96.wav wide.wav -c:a pcm_s24le -af 'volume=0.77'
+flac --totally-silent -5 -o wide.flac wide.wav
+convert song.wav noise.wav -c:a pcm_s24le -af 'aeval=random(0)*1.8-0.9|random(1)*1.8-0.9' -t 6
+flac --totally-silent --lax -0 -b 65535 -o noise.flac noise.wav
+
+# AAC: the encoder uses noise substitution unless told not to, the more the lower the rate
+convert song.wav low.aac -c:a aac -b:a 128k
+convert song.wav noisy.aac -c:a aac -b:a 48k
+convert song48.wav high.aac -c:a aac -b:a 320k
+convert mono.wav mono.aac -c:a aac -b:a 64k
+convert six.wav six.aac -c:a aac -b:a 384k
+convert mono.wav core.aac -c:a aac -b:a 32k -ar 22050
+
+# MP4: the same frames in every shape of container
+convert low.aac last.m4a -c:a copy -bsf:a aac_adtstoasc
+convert low.aac first.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart
+convert low.aac fragmented.mp4 -c:a copy -bsf:a aac_adtstoasc \
+  -movflags +delay_moov+default_base_moof -frag_duration 700000
+ffmpeg -nostdin -v error -y -f lavfi -i testsrc=size=64x64:rate=10:duration=12 -i low.aac \
+  -map 0:v -map 1:a -c:v mpeg4 -c:a copy -bsf:a aac_adtstoasc video.mp4
+ffmpeg -nostdin -v error -y -i video.mp4 -map 0:v -c copy silent.mp4
+ffmpeg -nostdin -v error -y -i low.aac -c copy -bsf:a aac_adtstoasc -metadata title='A Title' \
+  -metadata artist='An Artist' -metadata album='An Album' tagged.m4a
+convert mono.mp3 layer3.mp4 -c:a copy
+convert cbr.mp3 stereo3.mp4 -c:a copy
+convert mono.wav alac.m4a -c:a alac
+
+# Ogg
+oggenc --quiet -q 4 -s 1 -t 'A Title' -a 'An Artist' -l 'An Album' -o song.ogg song.wav
+oggenc --quiet -q 4 -s 2 -o other.ogg song22.wav
+oggenc --quiet -q 2 -s 3 -o mono.ogg mono.wav
+oggenc --quiet -q 2 -s 4 -o six.ogg six.wav
+ffmpeg -nostdin -v error -y -f lavfi -i testsrc=size=64x64:rate=10:duration=12 -i song.ogg \
+  -map 0:v -map 1:a -c:v libtheora -c:a copy video.ogv
+convert song48.wav opus.ogg -c:a libopus
+
+touch .complete

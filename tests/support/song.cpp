@@ -1,0 +1,141 @@
+#include "tests/support/song.h"
+
+#include <cmath>
+#include <cstddef>
+
+namespace support {
+namespace {
+
+constexpr double kTwoPi = 6.283185307179586;
+constexpr double kHitSeconds = 0.25;   // a hit has decayed by then
+constexpr double kNoiseDecay = 0.008;  // seconds, the stick: a short burst over the whole band
+constexpr double kKickDecay = 0.06;    // seconds
+constexpr double kKickHz = 62.0;
+constexpr double kChordBeats = 16.0;
+constexpr double kFloor = 0.0008;  // noise floor of full scale: no digital silence, no ties
+// The loud section enters with an accent of the bed and then swells: a loudness curve of
+// overlapping windows has one steepest place near the entry instead of several equal ones.
+constexpr double kAccentSeconds = 0.3;
+constexpr double kAccent = 1.35;
+constexpr double kSwellSeconds = 4.0;
+constexpr double kSwell = 0.15;
+constexpr double kFadeSeconds = 0.01;  // of the bed where the gain changes: no click of its own
+// Each chord is the second, third and fourth harmonic of its root: the bed's spectrum stands still.
+constexpr double kRootHz[4] = {110.0, 123.47, 98.0, 130.81};
+
+// xorshift, state never 0. Uniform in [-1, 1).
+struct noise {
+    uint32_t state;
+    double next() {
+        state ^= state << 13;
+        state ^= state >> 17;
+        state ^= state << 5;
+        return static_cast<double>(state) / 2147483648.0 - 1.0;
+    }
+};
+
+noise seeded(uint32_t seed, uint32_t use) {
+    noise made{(seed * 2654435761U) ^ (use * 2246822519U) ^ 0x9E3779B9U};
+    if (made.state == 0) made.state = 1;
+    for (int i = 0; i < 8; ++i) made.next();
+    return made;
+}
+
+double gain_at(const song_spec &spec, double t) {
+    if (t < spec.loud_at || t >= spec.tail_at) return spec.quiet_gain;
+    const double to_go = spec.loud_at > 0.0 ? 1.0 - (t - spec.loud_at) / kSwellSeconds : 0.0;
+    return spec.loud_gain * (1.0 - kSwell * std::fmax(to_go, 0.0));
+}
+
+double bed_gain_at(const song_spec &spec, double t) {
+    const bool accent =
+        spec.loud_at > 0.0 && t >= spec.loud_at && t < spec.loud_at + kAccentSeconds;
+    return gain_at(spec, t) * (accent ? kAccent : 1.0);
+}
+
+// As bed_gain_at, without a step: the bed reaches the new gain kFadeSeconds after the change.
+double faded_bed_gain_at(const song_spec &spec, double t) {
+    double sum = 0.0;
+    for (int k = 0; k < 4; ++k) sum += bed_gain_at(spec, t - kFadeSeconds * k / 4.0);
+    return sum / 4.0;
+}
+
+// Saturated, so that it is as loud for its peaks as recorded music is.
+void add_bed(const song_spec &spec, int32_t channel, std::vector<double> &out) {
+    noise random = seeded(spec.seed, 100U + static_cast<uint32_t>(channel));
+    double phase = random.next() * kTwoPi;
+    const double offset[2] = {random.next() * kTwoPi, random.next() * kTwoPi};
+    noise floor = seeded(spec.seed, 200U + static_cast<uint32_t>(channel));
+    const double chord_seconds = kChordBeats * 60.0 / spec.bpm;
+    for (size_t i = 0; i < out.size(); ++i) {
+        const double t = static_cast<double>(i) / spec.rate;
+        // Chords change on the grid of the hits; one whole cycle ahead keeps the index positive.
+        const double chord = (t - spec.first_hit) / chord_seconds + 4.0;
+        phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / spec.rate;
+        const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
+                           std::sin(4.0 * phase + offset[1]);
+        out[i] +=
+            spec.bed_level * faded_bed_gain_at(spec, t) * std::tanh(sum) + kFloor * floor.next();
+    }
+}
+
+// strength: around 1. Starts at the sample nearest to t.
+void add_hit(const song_spec &spec, double t, double strength, noise &random,
+             std::vector<double> &out) {
+    const size_t first = static_cast<size_t>(std::llround(t * spec.rate));
+    const size_t length = static_cast<size_t>(kHitSeconds * spec.rate);
+    const double level = spec.drum_level * strength * gain_at(spec, t);
+    for (size_t i = 0; i < length; ++i) {
+        const double dt = static_cast<double>(i) / spec.rate;
+        const double burst = random.next() * std::exp(-dt / kNoiseDecay);
+        const double kick = std::sin(kTwoPi * kKickHz * dt) * std::exp(-dt / kKickDecay);
+        if (first + i < out.size()) out[first + i] += level * (0.8 * burst + 0.7 * kick);
+    }
+}
+
+int16_t to_sample(double value) {
+    const double scaled = std::floor(value * 32767.0 + 0.5);
+    if (scaled > 32767.0) return 32767;
+    if (scaled < -32768.0) return -32768;
+    return static_cast<int16_t>(scaled);
+}
+
+}  // namespace
+
+song make_song(const song_spec &spec) {
+    song made;
+    made.spec = spec;
+    const size_t frames = static_cast<size_t>(std::llround(spec.seconds * spec.rate));
+    const size_t channels = static_cast<size_t>(spec.channels);
+    for (int k = 0;; ++k) {
+        const double t = spec.first_hit + k * 60.0 / spec.bpm;
+        if (t >= spec.seconds) break;
+        made.beats.push_back(t);
+        if (t < spec.gap_from || t >= spec.gap_to) made.hits.push_back(t);
+    }
+
+    std::vector<double> drums(frames, 0.0);
+    noise strengths = seeded(spec.seed, 1);
+    noise bursts = seeded(spec.seed, 2);
+    for (double t : made.hits) add_hit(spec, t, 1.0 + 0.15 * strengths.next(), bursts, drums);
+
+    made.pcm.resize(frames * channels);
+    for (size_t c = 0; c < channels; ++c) {
+        std::vector<double> mix = drums;
+        add_bed(spec, static_cast<int32_t>(c), mix);
+        for (size_t i = 0; i < frames; ++i) made.pcm[i * channels + c] = to_sample(mix[i]);
+    }
+    return made;
+}
+
+std::vector<int16_t> channel_of(const song &from, int32_t channel) {
+    const size_t channels = static_cast<size_t>(from.spec.channels);
+    std::vector<int16_t> out;
+    out.reserve(from.pcm.size() / channels);
+    for (size_t i = static_cast<size_t>(channel); i < from.pcm.size(); i += channels) {
+        out.push_back(from.pcm[i]);
+    }
+    return out;
+}
+
+}  // namespace support

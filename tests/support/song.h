@@ -1,0 +1,66 @@
+// Synthetic songs whose loud section, tempo and drum hits are known, and the WAV files that carry
+// them. The same description always gives the same samples.
+#ifndef TAVO_TESTS_SUPPORT_SONG_H
+#define TAVO_TESTS_SUPPORT_SONG_H
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace support {
+
+// A quiet opening, a loud section from loud_at on, a quiet tail from tail_at on. Hits fall on every
+// beat of the grid first_hit + k * 60 / bpm; between gap_from and gap_to the grid goes on without
+// audible hits.
+struct song_spec {
+    int32_t rate = 44100;  // Hz
+    int32_t channels = 2;  // every channel has the drums, each a tonal bed of its own
+    double seconds = 60.0;
+    double bpm = 120.0;
+    uint32_t seed = 1;        // varies the hits' strengths (no two alike), the noise and the bed
+    double loud_at = 20.0;    // seconds; 0 or less: loud from the start
+    double tail_at = 50.0;    // seconds; at or past the end: no tail
+    double quiet_gain = 0.2;  // of everything outside the loud section
+    double loud_gain = 1.0;
+    double first_hit = 0.5;               // seconds
+    double gap_from = 0.0, gap_to = 0.0;  // seconds, half open
+    double drum_level = 0.30;             // of full scale, before the gain
+    double bed_level = 0.40;              // of full scale, before the gain; 0 for drums alone
+};
+
+struct song {
+    song_spec spec;
+    std::vector<int16_t> pcm;   // [frames * channels] interleaved
+    std::vector<double> beats;  // seconds, the whole grid
+    std::vector<double> hits;   // seconds, the audible ones
+};
+
+song make_song(const song_spec &spec);
+
+// The samples of one channel.
+std::vector<int16_t> channel_of(const song &from, int32_t channel);
+
+enum class wav_coding { pcm8, pcm16, pcm24, pcm32, float32 };
+enum class wav_data_size { honest, zero, all_ones, too_large };  // what the data header claims
+
+struct wav_spec {
+    int32_t rate = 44100;
+    int32_t channels = 2;
+    wav_coding coding = wav_coding::pcm16;
+    bool extensible = false;  // WAVE_FORMAT_EXTENSIBLE with the coding in its sub-format
+    wav_data_size data_size = wav_data_size::honest;
+    bool other_chunks = false;  // odd-length LIST, fact and JUNK between format and data, one after
+    bool junk_first = false;    // a JUNK chunk before the format
+    int64_t cut_bytes = 0;      // taken off the file's end
+};
+
+// A whole file of interleaved 16-bit samples in the wanted coding.
+std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &spec);
+
+// Both return false, with errno set, when the file cannot be written whole.
+bool write_bytes(const std::string &path, const std::vector<uint8_t> &bytes);
+bool write_wav(const std::string &path, const song &what);  // canonical: 44-byte header, 16 bits
+
+}  // namespace support
+
+#endif

@@ -1,0 +1,156 @@
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+
+#include "tests/support/song.h"
+
+namespace support {
+namespace {
+
+using bytes = std::vector<uint8_t>;
+
+constexpr uint32_t kTagPcm = 1;
+constexpr uint32_t kTagFloat = 3;
+constexpr uint32_t kTagExtensible = 0xFFFE;
+// The last 14 bytes of every sub-format identifier of an extensible file.
+constexpr uint8_t kSubFormatTail[14] = {0x00, 0x00, 0x00, 0x00, 0x10, 0x00, 0x80,
+                                        0x00, 0x00, 0xAA, 0x00, 0x38, 0x9B, 0x71};
+
+void put(bytes &out, uint32_t value, int count) {  // little-endian
+    for (int i = 0; i < count; ++i) out.push_back(static_cast<uint8_t>(value >> (8 * i)));
+}
+
+void put_tag(bytes &out, const char *tag) {
+    out.insert(out.end(), tag, tag + 4);
+}
+
+// A chunk with its padding byte where the length is odd.
+void put_chunk(bytes &out, const char *tag, const bytes &body) {
+    put_tag(out, tag);
+    put(out, static_cast<uint32_t>(body.size()), 4);
+    out.insert(out.end(), body.begin(), body.end());
+    if (body.size() % 2 != 0) out.push_back(0);
+}
+
+int bytes_per_sample(wav_coding coding) {
+    switch (coding) {
+        case wav_coding::pcm8:
+            return 1;
+        case wav_coding::pcm16:
+            return 2;
+        case wav_coding::pcm24:
+            return 3;
+        case wav_coding::pcm32:
+        case wav_coding::float32:
+            return 4;
+    }
+    return 2;
+}
+
+void put_sample(bytes &out, int16_t sample, wav_coding coding) {
+    const uint32_t wide = static_cast<uint32_t>(static_cast<int32_t>(sample));
+    switch (coding) {
+        case wav_coding::pcm8:
+            out.push_back(static_cast<uint8_t>((sample >> 8) + 128));
+            break;
+        case wav_coding::pcm16:
+            put(out, wide, 2);
+            break;
+        case wav_coding::pcm24:
+            put(out, wide << 8, 3);
+            break;
+        case wav_coding::pcm32:
+            put(out, wide << 16, 4);
+            break;
+        case wav_coding::float32: {
+            const float value = static_cast<float>(sample) / 32768.0F;
+            uint32_t bits = 0;
+            memcpy(&bits, &value, sizeof(bits));
+            put(out, bits, 4);
+        }
+    }
+}
+
+bytes format_chunk(const wav_spec &spec) {
+    const uint32_t size = static_cast<uint32_t>(bytes_per_sample(spec.coding));
+    const uint32_t tag = spec.coding == wav_coding::float32 ? kTagFloat : kTagPcm;
+    const uint32_t frame = size * static_cast<uint32_t>(spec.channels);
+    bytes body;
+    put(body, spec.extensible ? kTagExtensible : tag, 2);
+    put(body, static_cast<uint32_t>(spec.channels), 2);
+    put(body, static_cast<uint32_t>(spec.rate), 4);
+    put(body, static_cast<uint32_t>(spec.rate) * frame, 4);
+    put(body, frame, 2);
+    put(body, size * 8, 2);
+    if (spec.extensible) {
+        put(body, 22, 2);                            // bytes that follow
+        put(body, size * 8, 2);                      // bits in use
+        put(body, spec.channels == 1 ? 4U : 3U, 4);  // front centre, or left and right
+        put(body, tag, 2);
+        body.insert(body.end(), kSubFormatTail, kSubFormatTail + sizeof(kSubFormatTail));
+    }
+    return body;
+}
+
+uint32_t claimed_size(wav_data_size claim, uint32_t real) {
+    switch (claim) {
+        case wav_data_size::honest:
+            return real;
+        case wav_data_size::zero:
+            return 0;
+        case wav_data_size::all_ones:
+            return 0xFFFFFFFFU;
+        case wav_data_size::too_large:
+            return real + 1'000'000U;
+    }
+    return real;
+}
+
+}  // namespace
+
+std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &spec) {
+    bytes data;
+    data.reserve(pcm.size() * static_cast<size_t>(bytes_per_sample(spec.coding)));
+    for (int16_t sample : pcm) put_sample(data, sample, spec.coding);
+
+    bytes out;
+    put_tag(out, "RIFF");
+    put(out, 0, 4);
+    put_tag(out, "WAVE");
+    if (spec.junk_first) put_chunk(out, "JUNK", bytes(27, 0x55));
+    put_chunk(out, "fmt ", format_chunk(spec));
+    if (spec.other_chunks) {
+        // The odd bodies spell "data": a reader that forgets the padding finds a false chunk.
+        put_chunk(out, "LIST", bytes{'I', 'N', 'F', 'O', 'd', 'a', 't', 'a', 1, 0, 0, 0, 7});
+        put_chunk(out, "fact", bytes{0, 0, 0, 0});
+        put_chunk(out, "JUNK", bytes(33, 'd'));
+    }
+    put_tag(out, "data");
+    const uint32_t real = static_cast<uint32_t>(data.size());
+    put(out, claimed_size(spec.data_size, real), 4);
+    out.insert(out.end(), data.begin(), data.end());
+    if (data.size() % 2 != 0) out.push_back(0);
+    if (spec.other_chunks) put_chunk(out, "LIST", bytes{'I', 'N', 'F', 'O', 9});
+
+    const uint32_t riff = static_cast<uint32_t>(out.size() - 8);
+    for (size_t i = 0; i < 4; ++i) out[4 + i] = static_cast<uint8_t>(riff >> (8 * i));
+    const size_t cut = static_cast<size_t>(spec.cut_bytes);
+    out.resize(cut < out.size() ? out.size() - cut : 0);
+    return out;
+}
+
+bool write_bytes(const std::string &path, const std::vector<uint8_t> &content) {
+    FILE *file = fopen(path.c_str(), "wb");
+    if (file == nullptr) return false;
+    const bool whole = fwrite(content.data(), 1, content.size(), file) == content.size();
+    return (fclose(file) == 0) && whole;
+}
+
+bool write_wav(const std::string &path, const song &what) {
+    wav_spec spec;
+    spec.rate = what.spec.rate;
+    spec.channels = what.spec.channels;
+    return write_bytes(path, wav_bytes(what.pcm, spec));
+}
+
+}  // namespace support
