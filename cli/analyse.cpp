@@ -1,0 +1,127 @@
+#include "cli/analyse.h"
+
+#include <poll.h>
+#include <unistd.h>
+
+#include <cerrno>
+
+#include "cli/click.h"
+#include "cli/explain.h"
+#include "cli/library_path.h"
+#include "core/tavo_ctx.h"
+
+namespace {
+
+// Written by the callback on the job's thread, which is told nothing of its caller.
+int done_write_fd = -1;
+
+void on_result(TAVO_INFO *) {
+    const char done = 1;
+    while (write(done_write_fd, &done, 1) < 0 && errno == EINTR) {
+    }
+}
+
+// Waits for the callback or the stop. Returns false for the stop.
+bool wait_for_result(int done_fd, int stop_fd) {
+    pollfd watched[2] = {{done_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
+    while (true) {
+        if (poll(watched, 2, -1) < 0) continue;  // EINTR
+        if (watched[0].revents != 0) return true;
+        if (watched[1].revents != 0) return false;
+    }
+}
+
+void take_stream(const TAVO_CTX *ctx, record &out) {
+    out.has_stream = true;
+    out.sample_rate = ctx->fmt.sample_rate;
+    out.channels = ctx->fmt.channels;
+    out.duration_ms = ctx->duration / kUnitsPerMs;
+}
+
+// After the callback the job writes nothing any more.
+void take_result(const TAVO_CTX *ctx, record &out) {
+    if (ctx->pcm_bytes <= 0) {
+        out.error = "No audio could be decoded from the file.";
+        return;
+    }
+    out.has_highlight = out.mode != TAVO_MODE_BEATS;
+    out.hl_pos_ms = ctx->info->hl_pos;
+    if (ctx->info->status != 0) {
+        out.error = out.mode == TAVO_MODE_BOTH
+                        ? "No beats were found after the highlight."
+                        : "No beats were found: the file may be silent or too short for a rhythm.";
+        return;
+    }
+    out.status = outcome::ok;
+    if (out.mode == TAVO_MODE_HIGHLIGHT) return;
+    out.has_beats = true;
+    out.bpm = ctx->onset->bpm;
+    const TAVO_INFO *info = ctx->info;
+    out.beats_ms.assign(info->beat_times, info->beat_times + info->beat_count);
+}
+
+// Runs the job of an instance and releases it.
+void run_job(TAVO_CTX *ctx, const options &how, int stop_fd, record &out) {
+    take_stream(ctx, out);
+    int done_pipe[2];
+    if (pipe(done_pipe) != 0) {
+        out.error = system_sentence("The analysis could not be started", errno);
+        tavo_deinit(ctx);
+        return;
+    }
+    done_write_fd = done_pipe[1];
+    tavo_setcallback(ctx, on_result);
+    const int32_t code = tavo_analyze(ctx, how.length_s, how.max_beats, 0);
+    if (code != TAVO_OK) {
+        out.error = "The analysis could not be started (code " + std::to_string(code) + ").";
+    } else if (wait_for_result(done_pipe[0], stop_fd)) {
+        take_result(ctx, out);
+    } else {
+        out.status = outcome::stopped;
+        out.error = "The analysis was stopped.";
+    }
+    tavo_deinit(ctx);
+    close(done_pipe[0]);
+    close(done_pipe[1]);
+}
+
+void analyse_opened(const library_path &opened, const options &how, int stop_fd, record &out) {
+    const TAVO_PARAM param = {opened.path.c_str(), how.mode};
+    int32_t code = TAVO_OK;
+    TAVO_CTX *ctx = tavo_init(&param, &code);
+    if (ctx == nullptr) {
+        out.error = explain_unusable(opened.path, code, out);
+        return;
+    }
+    run_job(ctx, how, stop_fd, out);
+}
+
+}  // namespace
+
+record failed_record(const std::string &file, int32_t mode, const std::string &error) {
+    record made;
+    made.file = file;
+    made.mode = mode;
+    made.error = error;
+    return made;
+}
+
+record analyse(const std::string &path, const options &how, int stop_fd) {
+    record out = failed_record(path, how.mode, explain_before_open(path));
+    out.length_s = how.length_s;
+    if (!out.error.empty()) return out;
+
+    click_file click;
+    out.error = begin_click(click, how.click, path);
+    if (!out.error.empty()) return out;
+
+    library_path opened = open_library_path(path);
+    analyse_opened(opened, how, stop_fd, out);
+    close_library_path(opened);
+    const std::string error = finish_click(click, out.status == outcome::ok);
+    if (!error.empty()) {
+        out.status = outcome::failed;
+        out.error = error;
+    }
+    return out;
+}

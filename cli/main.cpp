@@ -1,0 +1,44 @@
+// The command: options, the files they name, their results. See options.h, inputs.h, workers.h.
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <exception>
+
+#include "cli/inputs.h"
+#include "cli/options.h"
+#include "cli/stop.h"
+#include "cli/workers.h"
+
+namespace {
+
+// A pipe of ours must not get the number of a standard stream that came closed. Writing to such a
+// stream still fails.
+void hold_standard_streams() {
+    for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {
+        if (fcntl(fd, F_GETFD) < 0) open("/dev/null", O_RDONLY);
+    }
+}
+
+int run(int argc, char **argv) {
+    hold_standard_streams();
+    options how;
+    if (const std::optional<int> status = parse_options(argc, argv, how)) return *status;
+    if (!watch_for_stop()) {
+        perror("tavo");
+        return kExitFailed;
+    }
+    const std::vector<input> inputs = expand_inputs(how, stop_requested);
+    return run_workers(how, inputs);
+}
+
+}  // namespace
+
+int main(int argc, char **argv) {
+    try {
+        return run(argc, argv);
+    } catch (const std::exception &wrong) {  // memory for names and texts
+        fprintf(stderr, "tavo: %s\n", wrong.what());
+        return kExitFailed;
+    }
+}

@@ -1,0 +1,21 @@
+// File names are bytes. How they are shown to people, and where they are not text at all.
+#ifndef TAVO_CLI_NAMES_H
+#define TAVO_CLI_NAMES_H
+
+#include <string>
+
+bool is_utf8(const std::string &bytes);
+
+// One line, whatever the bytes: control characters as \n, \t or \xNN, a backslash doubled, bytes
+// that are not UTF-8 as \xNN.
+std::string shown(const std::string &bytes);
+
+// Valid UTF-8: each byte that is not part of a character becomes U+FFFD.
+std::string as_utf8(const std::string &bytes);
+
+// Every byte outside A-Z a-z 0-9 - . _ ~ / as %NN.
+std::string percent_encoded(const std::string &bytes);
+
+std::string base_name(const std::string &path);
+
+#endif

@@ -1,0 +1,36 @@
+// The command line, read once. In: argc, argv. Out: options. Before: inputs.h, workers.h.
+#ifndef TAVO_CLI_OPTIONS_H
+#define TAVO_CLI_OPTIONS_H
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+enum class result_format { text, json, csv, labels };
+
+struct options {
+    int32_t mode = 0;       // TAVO_MODE_*
+    int32_t length_s = 0;   // 0 for none
+    int32_t max_beats = 0;  // 0 for no limit
+    result_format format = result_format::text;
+    std::string click;       // where the click track goes, empty for none
+    std::string output_dir;  // of labels; empty: beside each input
+    bool force = false;
+    bool quiet = false;
+    bool recursive = false;
+    int32_t jobs = 1;
+    char list_separator = '\n';       // of the lists that name files
+    std::vector<std::string> lists;   // files that name files, "-" for standard input
+    std::vector<std::string> inputs;  // in the order given; "-" is a list on standard input
+};
+
+constexpr int kExitOk = 0;
+constexpr int kExitFailed = 1;  // a file failed
+constexpr int kExitUsage = 2;
+constexpr int kExitSignal = 128;  // plus the number of the signal that stopped the command
+
+// Returns the exit status when the command is done already (help, version, wrong usage).
+std::optional<int> parse_options(int argc, char **argv, options &out);
+
+#endif

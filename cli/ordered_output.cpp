@@ -1,0 +1,91 @@
+#include "cli/ordered_output.h"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+
+#include "cli/explain.h"
+#include "cli/format.h"
+#include "cli/stop.h"
+
+namespace {
+
+void write_result(ordered_output &out, const std::string &text) {
+    if (text.empty() || output_failed(out)) return;
+    clear_progress(out.bar);
+    const int code = write_all(STDOUT_FILENO, text.data(), text.size());
+    if (code == EPIPE) {
+        out.reader_gone = true;
+    } else if (code != 0) {
+        out.write_error = code;
+    }
+}
+
+void write_reply(ordered_output &out, const reply &made) {
+    if (made.status == outcome::stopped) return;
+    if (made.status == outcome::failed) out.a_file_failed = true;
+    write_result(out, made.result);
+    if (!output_failed(out)) write_message(out, made.message);
+}
+
+}  // namespace
+
+ordered_output start_output(const options &how, size_t total) {
+    ordered_output out;
+    out.total = total;
+    struct stat info {};
+    out.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
+    out.bar = start_progress(total, how.quiet);
+    write_result(out, format_head(how.format));
+    return out;
+}
+
+void accept_reply(ordered_output &out, uint32_t index, reply &&made) {
+    if (made.status != outcome::stopped) ++out.done;
+    out.waiting.emplace(index, std::move(made));
+    auto first = out.waiting.begin();
+    while (first != out.waiting.end() && first->first == out.next) {
+        write_reply(out, first->second);
+        first = out.waiting.erase(first);
+        ++out.next;
+    }
+}
+
+void write_message(ordered_output &out, const std::string &text) {
+    if (text.empty()) return;
+    clear_progress(out.bar);
+    write_all(STDERR_FILENO, text.data(), text.size());
+}
+
+void note_reader_gone(ordered_output &out) {
+    out.reader_gone = true;
+}
+
+bool output_failed(const ordered_output &out) {
+    return out.reader_gone || out.write_error != 0;
+}
+
+int redraw_timeout_ms(const ordered_output &out) {
+    return out.bar.shown ? kRedrawMs : -1;
+}
+
+void redraw(ordered_output &out) {
+    draw_progress(out.bar, out.done);
+}
+
+int finish_output(ordered_output &out, bool unclean) {
+    for (const auto &entry : out.waiting) write_reply(out, entry.second);
+    clear_progress(out.bar);
+    if (out.write_error != 0) {
+        write_message(
+            out,
+            "tavo: " + system_sentence("The results cannot be written", out.write_error) + "\n");
+    }
+    if (stop_signal() != 0) {
+        write_message(out, "tavo: stopped; " + std::to_string(out.done) + " of " +
+                               std::to_string(out.total) + " files are done.\n");
+        return kExitSignal + stop_signal();
+    }
+    return out.a_file_failed || out.write_error != 0 || unclean ? kExitFailed : kExitOk;
+}

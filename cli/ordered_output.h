@@ -1,0 +1,39 @@
+// Replies arrive in any order and leave in the order of the inputs: results on standard output,
+// messages on standard error, the progress line out of their way.
+#ifndef TAVO_CLI_ORDERED_OUTPUT_H
+#define TAVO_CLI_ORDERED_OUTPUT_H
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <string>
+
+#include "cli/options.h"
+#include "cli/progress.h"
+#include "cli/worker.h"
+
+struct ordered_output {
+    std::map<uint32_t, reply> waiting;  // for earlier inputs
+    uint32_t next = 0;                  // input to write
+    size_t total = 0;                   // inputs
+    size_t done = 0;                    // replies of analyses that were not stopped
+    bool a_file_failed = false;
+    bool reader_gone = false;  // standard output was closed by its reader
+    int write_error = 0;       // errno of any other failure on standard output
+    bool to_pipe = false;      // standard output is a pipe, whose reader may go
+    progress bar;
+};
+
+ordered_output start_output(const options &how, size_t total);
+void accept_reply(ordered_output &out, uint32_t index, reply &&made);
+void write_message(ordered_output &out, const std::string &text);
+void note_reader_gone(ordered_output &out);
+bool output_failed(const ordered_output &out);
+
+int redraw_timeout_ms(const ordered_output &out);  // for poll: -1 when there is no line
+void redraw(ordered_output &out);
+
+// Writes what is finished but waited for inputs that were stopped. Returns the exit status.
+int finish_output(ordered_output &out, bool unclean);
+
+#endif

@@ -1,0 +1,29 @@
+// Files that the command writes: complete under their name or not there at all.
+#ifndef TAVO_CLI_OUTPUT_FILE_H
+#define TAVO_CLI_OUTPUT_FILE_H
+
+#include <string>
+
+// A temporary file in the folder of the target, with the permissions of a new file.
+struct output_file {
+    std::string target;
+    std::string temporary;  // empty when nothing is left to remove
+    int fd = -1;            // open for writing, -1 once closed
+};
+
+// These return an empty string or a sentence that says what failed.
+
+// Whether the target could be written: the folder can be and, without force, the target is not
+// there. Makes nothing.
+std::string check_target(const std::string &target, bool force);
+
+std::string begin_output(output_file &file, const std::string &target);
+std::string write_output(output_file &file, const std::string &content);
+
+// Gives the file its name; without force an existing target stays and the temporary is removed.
+std::string commit_output(output_file &file, bool force);
+
+// Removes what is left. Harmless after a commit and when called twice.
+void abandon_output(output_file &file);
+
+#endif

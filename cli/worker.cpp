@@ -1,0 +1,95 @@
+#include "cli/worker.h"
+
+#include <unistd.h>
+
+#include <cerrno>
+#include <exception>
+
+#include "cli/analyse.h"
+#include "cli/format.h"
+#include "cli/names.h"
+#include "cli/output_file.h"
+
+namespace {
+
+std::string write_track(record &what, const options &how, const std::string &target) {
+    output_file file;
+    std::string error = begin_output(file, target);
+    if (error.empty()) error = write_output(file, label_track(what));
+    if (error.empty()) error = commit_output(file, how.force);
+    abandon_output(file);
+    if (error.empty()) what.written = target;
+    return error;
+}
+
+// The analysis and, where the format makes a file of its own, that file. A target that cannot be
+// written is found out before the work is done.
+record analyse_and_write(const std::string &path, const options &how, int stop_fd) {
+    if (how.format != result_format::labels) return analyse(path, how, stop_fd);
+    const std::string target = label_path(path, how.output_dir);
+    std::string error = check_target(target, how.force);
+    if (!error.empty()) return failed_record(path, how.mode, error);
+    record out = analyse(path, how, stop_fd);
+    if (out.status != outcome::ok) return out;
+    error = write_track(out, how, target);
+    if (error.empty()) return out;
+    return failed_record(path, how.mode, error);
+}
+
+reply answer(const input &asked, const options &how, int stop_fd) {
+    try {
+        if (!asked.error.empty()) {
+            return make_reply(failed_record(asked.path, how.mode, asked.error), how);
+        }
+        return make_reply(analyse_and_write(asked.path, how, stop_fd), how);
+    } catch (const std::exception &) {  // the strings' memory is all that can fail here
+        reply out;
+        out.message = "tavo: there is not enough memory for the result of a file.\n";
+        return out;
+    }
+}
+
+bool read_request(int fd, uint32_t &index) {
+    while (true) {
+        const ssize_t got = read(fd, &index, sizeof(index));
+        if (got == static_cast<ssize_t>(sizeof(index))) return true;
+        if (got >= 0 || errno != EINTR) return false;
+    }
+}
+
+}  // namespace
+
+reply make_reply(const record &what, const options &how) {
+    reply out;
+    out.status = what.status;
+    out.result = format_record(how.format, what);
+    if (what.status == outcome::failed) {
+        out.message = "tavo: " + shown(what.file) + ": " + what.error + "\n";
+    }
+    return out;
+}
+
+int write_all(int fd, const char *data, size_t size) {
+    for (size_t done = 0; done < size;) {
+        const ssize_t got = write(fd, data + done, size - done);
+        if (got < 0 && errno != EINTR) return errno;
+        if (got > 0) done += static_cast<size_t>(got);
+    }
+    return 0;
+}
+
+int serve_requests(int request_fd, int reply_fd, const options &how,
+                   const std::vector<input> &inputs) {
+    uint32_t index = 0;
+    while (read_request(request_fd, index) && index < inputs.size()) {
+        const reply made = answer(inputs[index], how, request_fd);
+        const reply_head head = {index, static_cast<int32_t>(made.status),
+                                 static_cast<uint32_t>(made.result.size()),
+                                 static_cast<uint32_t>(made.message.size())};
+        std::string sent(reinterpret_cast<const char *>(&head), sizeof(head));
+        sent += made.result;
+        sent += made.message;
+        if (write_all(reply_fd, sent.data(), sent.size()) != 0) break;
+    }
+    return 0;
+}

@@ -1,0 +1,15 @@
+// The command's side of the worker processes: hands out the inputs, collects the replies and
+// writes them in the order of the inputs.
+#ifndef TAVO_CLI_WORKERS_H
+#define TAVO_CLI_WORKERS_H
+
+#include <vector>
+
+#include "cli/inputs.h"
+#include "cli/options.h"
+
+// Returns the command's exit status. Single-threaded, so that a fork is safe at any moment; in a
+// worker process it does not return.
+int run_workers(const options &how, const std::vector<input> &inputs);
+
+#endif
