@@ -117,10 +117,12 @@ void close_analysis(analysis *a) {
 
 void set_up(benchmark::State &state) {
     analysis a;
+    open_analysis(&a);
     for (auto _ : state) {
-        open_analysis(&a);
         close_analysis(&a);
+        open_analysis(&a);
     }
+    close_analysis(&a);
 }
 
 void power_rises(benchmark::State &state) {

@@ -1,10 +1,11 @@
 #include "highlight/search.h"
 
+#include <algorithm>
+#include <cmath>
 #include <cstdlib>
 #include <cstring>
 
 #include "dsp/peaks.h"
-#include "dsp/sort.h"
 #include "dsp/stats.h"
 #include "highlight/region.h"
 
@@ -49,13 +50,20 @@ uint32_t point_ms(int64_t k) {
     return static_cast<uint32_t>(static_cast<int64_t>(static_cast<float>(k + k) * 1000.0f));
 }
 
+// Ascending, values that are no numbers last: an order that holds for any content.
+bool power_before(float a, float b) {
+    if (std::isnan(a) || std::isnan(b)) return !std::isnan(a);
+    return a < b;
+}
+
 // The largest value, and the 60th percentile in *percentile. False when memory runs out.
+// std::sort asks for no memory; qsort without memory relies on a comparator that can say "equal".
 bool rank_envelope(const float *power, int32_t n, float *largest, float *percentile) {
     const size_t count = static_cast<size_t>(n);
     float *sorted = static_cast<float *>(malloc(count * sizeof(float)));
     if (sorted == nullptr) return false;
     memcpy(sorted, power, count * sizeof(float));
-    qsort(sorted, count, sizeof(float), compare_fvalue);
+    std::sort(sorted, sorted + count, power_before);
     *largest = sorted[n - 1];
     *percentile = sorted[static_cast<int64_t>(n) * kPercentile / 100];
     free(sorted);
