@@ -53,12 +53,11 @@ extern "C" int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_bea
 
     // Before the thread exists: a quick job's final state must not be overwritten.
     store_flag(&ctx->state, kStateRunning);
-    pthread_t worker{};
-    if (pthread_create(&worker, nullptr, entry, ctx) != 0) {
+    if (pthread_create(&ctx->worker, nullptr, entry, ctx) != 0) {
+        ctx->worker = pthread_t{};
         store_flag(&ctx->state, kStateReady);
         return TAVO_ERR_MEMORY;
     }
-    ctx->worker = worker;
     return TAVO_OK;
 }
 

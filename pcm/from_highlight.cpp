@@ -23,7 +23,8 @@ constexpr int64_t kSecondsBefore = 1;
 constexpr int64_t kSecondsAfter = 3;
 
 // Bytes of PCM that surely are in the buffer which was decoded by the plan of these records: what
-// they brought, less what is dropped before stitching, and never more than the buffer has.
+// they brought, less what is dropped before stitching, and never more than the buffer has: it was
+// planned from the first segment's start to the end of the stream.
 int64_t decoded_bytes(const TAVO_DECSEG *seg) {
     const int32_t rate = seg->fmt.sample_rate;
     int64_t sum = 0;
@@ -33,8 +34,12 @@ int64_t decoded_bytes(const TAVO_DECSEG *seg) {
         if (__builtin_add_overflow(sum, brought, &sum)) return 0;
     }
     int64_t allocated = 0;
+    int64_t planned = 0;
     if (seg->count > 1 && seg->duration > 0) {
-        if (!span_bytes(seg->duration, rate, &allocated)) return 0;
+        if (__builtin_sub_overflow(seg->duration, seg->start, &planned) ||
+            !span_bytes(planned, rate, &allocated)) {
+            return 0;
+        }
         sum = std::min(sum, allocated);
     }
     return sum;
@@ -84,7 +89,12 @@ int32_t settle_start(TAVO_CTX *ctx, int64_t pos, int64_t *off) {
     const auto seconds = static_cast<float>(ctx->hl->hl_pos) / kMsPerSecond;
     const float expected = seconds * 2.0F * static_cast<float>(ctx->fmt.sample_rate);
     *off = static_cast<int64_t>(expected);
-    if (_compare_decoded(&ctx->seg[0], ctx->pcm, off) == 0) return 0;
+    // The records tell what the segments brought, and seams take some of that back: a block beyond
+    // the PCM is none, and as the lowest match is the one reported, there is none inside either.
+    if (_compare_decoded(&ctx->seg[0], ctx->pcm, off) == 0 &&
+        *off <= ctx->pcm_bytes - kProbeBlockAt - kMatchBytes) {
+        return 0;
+    }
 
     *off = 0;
     return decode_again(ctx, reached);
