@@ -3,6 +3,7 @@
 #include <poll.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cerrno>
 
 #include "cli/click.h"
@@ -12,10 +13,13 @@
 
 namespace {
 
-// Written by the callback on the job's thread, which is told nothing of its caller.
+// Written by the callback on the job's thread, which is told nothing of its caller: the flag hands
+// the result over, the pipe wakes the waiting thread.
+std::atomic<bool> result_ready{false};
 int done_write_fd = -1;
 
 void on_result(TAVO_INFO *) {
+    result_ready.store(true, std::memory_order_release);
     const char done = 1;
     while (write(done_write_fd, &done, 1) < 0 && errno == EINTR) {
     }
@@ -26,7 +30,7 @@ bool wait_for_result(int done_fd, int stop_fd) {
     pollfd watched[2] = {{done_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
     while (true) {
         if (poll(watched, 2, -1) < 0) continue;  // EINTR
-        if (watched[0].revents != 0) return true;
+        if (watched[0].revents != 0) return result_ready.load(std::memory_order_acquire);
         if (watched[1].revents != 0) return false;
     }
 }
@@ -70,6 +74,7 @@ void run_job(TAVO_CTX *ctx, const options &how, int stop_fd, record &out) {
         return;
     }
     done_write_fd = done_pipe[1];
+    result_ready.store(false);
     tavo_setcallback(ctx, on_result);
     const int32_t code = tavo_analyze(ctx, how.length_s, how.max_beats, 0);
     if (code != TAVO_OK) {

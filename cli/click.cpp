@@ -16,13 +16,6 @@ namespace {
 
 constexpr size_t kHeaderBytes = 44;  // of the track's WAV header; its last four give the data size
 
-bool same_file(const std::string &a, const std::string &b) {
-    struct stat left {};
-    struct stat right {};
-    return stat(a.c_str(), &left) == 0 && stat(b.c_str(), &right) == 0 &&
-           left.st_dev == right.st_dev && left.st_ino == right.st_ino;
-}
-
 // The library ignores write errors: a full disk shows only in the length.
 bool is_whole_track(const std::string &path) {
     const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);

@@ -100,10 +100,15 @@ std::string explain_source_code(const std::string &path, int32_t type, int32_t c
             return "There is not enough memory to open the file.";
         case TAVO_ERR_FORMAT:
             if (type == kTypeWav) return explain_wav(path);
-            return what +
-                   "has parameters that are not supported, such as a sample rate above "
-                   "48000 Hz or more channels than two.";
+            if (type == kTypeMp4) {
+                return "The MP4 file's audio is neither AAC nor MP3, or its sample rate is not "
+                       "within 8000 to 48000 Hz.";
+            }
+            return what + "has a sample rate that is not read; 8000 to 48000 Hz are.";
         case TAVO_ERR_OPEN:
+            if (type == kTypeOgg) {
+                return "The Ogg file has no usable audio stream; only Vorbis is read from Ogg.";
+            }
             return what + "has no usable audio stream.";
         case TAVO_ERR_READ:
             return what + "cannot be read or decoded.";

@@ -2,6 +2,8 @@
 
 #include <array>
 #include <charconv>
+#include <cmath>
+#include <cstdio>
 
 #include "core/tavo.h"
 
@@ -44,6 +46,19 @@ const char *status_word(outcome status) {
             return "stopped";
     }
     return "failed";
+}
+
+std::string clock_text(double ms) {
+    const long long tenths = std::llround(ms / 100.0);
+    const long long whole = tenths / 10;
+    std::array<char, 48> text{};
+    if (whole >= 3600) {
+        snprintf(text.data(), text.size(), "%lld:%02lld:%02lld.%lld", whole / 3600, whole / 60 % 60,
+                 whole % 60, tenths % 10);
+    } else {
+        snprintf(text.data(), text.size(), "%lld:%02lld.%lld", whole / 60, whole % 60, tenths % 10);
+    }
+    return text.data();
 }
 
 std::string number(float value) {

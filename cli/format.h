@@ -27,6 +27,9 @@ std::string labels_record(const record &what);
 const char *mode_word(int32_t mode);
 const char *status_word(outcome status);
 
+// m:ss.t, or h:mm:ss.t from an hour on.
+std::string clock_text(double ms);
+
 // Shortest decimal that gives the same float again.
 std::string number(float value);
 

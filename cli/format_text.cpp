@@ -1,29 +1,11 @@
-#include <array>
-#include <cmath>
-#include <cstdio>
-
 #include "cli/format.h"
 #include "cli/names.h"
 
 namespace {
 
-// m:ss.t, or h:mm:ss.t from an hour on.
-std::string clock(double ms) {
-    const long long tenths = std::llround(ms / 100.0);
-    const long long whole = tenths / 10;
-    std::array<char, 48> text{};
-    if (whole >= 3600) {
-        snprintf(text.data(), text.size(), "%lld:%02lld:%02lld.%lld", whole / 3600, whole / 60 % 60,
-                 whole % 60, tenths % 10);
-    } else {
-        snprintf(text.data(), text.size(), "%lld:%02lld.%lld", whole / 60, whole % 60, tenths % 10);
-    }
-    return text.data();
-}
-
 std::string highlight_line(const record &what) {
-    std::string line = "  highlight  " + clock(what.hl_pos_ms);
-    if (what.length_s > 0) line += " to " + clock(what.hl_pos_ms + 1000.0 * what.length_s);
+    std::string line = "  highlight  " + clock_text(what.hl_pos_ms);
+    if (what.length_s > 0) line += " to " + clock_text(what.hl_pos_ms + 1000.0 * what.length_s);
     return line + "\n";
 }
 
@@ -31,8 +13,8 @@ std::string beats_lines(const record &what) {
     std::string lines = "  tempo      " + std::to_string(what.bpm) + " BPM\n";
     lines += "  beats      " + std::to_string(what.beats_ms.size());
     if (!what.beats_ms.empty()) {
-        lines += ", from " + clock(static_cast<double>(what.beats_ms.front())) + " to " +
-                 clock(static_cast<double>(what.beats_ms.back()));
+        lines += ", from " + clock_text(static_cast<double>(what.beats_ms.front())) + " to " +
+                 clock_text(static_cast<double>(what.beats_ms.back()));
     }
     return lines + "\n";
 }
@@ -42,7 +24,7 @@ std::string beats_lines(const record &what) {
 std::string text_record(const record &what) {
     if (what.status != outcome::ok) return "";  // the message on standard error says it
     std::string text = shown(what.file) + "\n  stream     " +
-                       clock(static_cast<double>(what.duration_ms)) + ", " +
+                       clock_text(static_cast<double>(what.duration_ms)) + ", " +
                        std::to_string(what.sample_rate) + " Hz, " + std::to_string(what.channels) +
                        (what.channels == 1 ? " channel\n" : " channels\n");
     if (what.has_highlight) text += highlight_line(what);

@@ -90,10 +90,14 @@ void declare_output(CLI::App &app, options &out, words &read) {
     app.add_option("-o,--output-dir", out.output_dir,
                    "Folder for the label tracks, else beside each file")
         ->type_name("DIR");
-    app.add_flag("--force", out.force, "Overwrite label tracks that exist");
+    app.add_flag("--force", out.force, "Overwrite label tracks and pictures that exist");
     app.add_option("--click", out.click,
                    "Write the sound with a click on every beat, a WAV file;\none input only")
         ->type_name("WAV");
+    app.add_option("--plot", out.plot,
+                   "Draw the result, an SVG file: waveform, loudness,\nhighlight and beats; one "
+                   "input only")
+        ->type_name("SVG");
     app.add_flag("-q,--quiet", out.quiet, "No progress bar and no notes");
 }
 
@@ -121,6 +125,7 @@ void set_values(const words &read, options &out) {
                  : read.format == "labels" ? result_format::labels
                                            : result_format::text;
     unshield(out.click);
+    unshield(out.plot);
     unshield(out.output_dir);
     for (std::string &input : out.inputs) unshield(input);
     for (std::string &list : out.lists) unshield(list);
@@ -143,10 +148,15 @@ std::string contradiction(const options &out, bool null_separated) {
     if (!out.output_dir.empty() && !is_folder(out.output_dir)) {
         return out.output_dir + ": is not a folder.";
     }
-    if (out.click.empty()) return "";
-    if (out.mode == TAVO_MODE_HIGHLIGHT) return "--click needs beats: --mode beats or both.";
-    if (out.inputs.size() != 1 || list_on_stdin || !out.lists.empty() || is_folder(out.inputs[0])) {
-        return "--click takes exactly one audio file.";
+    if (!out.click.empty() && out.mode == TAVO_MODE_HIGHLIGHT) {
+        return "--click needs beats: --mode beats or both.";
+    }
+    if (!out.click.empty() && out.click == out.plot) return "--click and --plot name one file.";
+    const bool single = !out.click.empty() || !out.plot.empty();
+    if (single && (out.inputs.size() != 1 || list_on_stdin || !out.lists.empty() ||
+                   is_folder(out.inputs[0]))) {
+        return std::string(out.click.empty() ? "--plot" : "--click") +
+               " takes exactly one audio file.";
     }
     return "";
 }

@@ -15,6 +15,7 @@ struct options {
     int32_t max_beats = 0;  // 0 for no limit
     result_format format = result_format::text;
     std::string click;       // where the click track goes, empty for none
+    std::string plot;        // where the picture goes, empty for none
     std::string output_dir;  // of labels; empty: beside each input
     bool force = false;
     bool quiet = false;

@@ -75,7 +75,6 @@ void redraw(ordered_output &out) {
 }
 
 int finish_output(ordered_output &out, bool unclean) {
-    for (const auto &entry : out.waiting) write_reply(out, entry.second);
     clear_progress(out.bar);
     if (out.write_error != 0) {
         write_message(

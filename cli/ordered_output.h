@@ -33,7 +33,8 @@ bool output_failed(const ordered_output &out);
 int redraw_timeout_ms(const ordered_output &out);  // for poll: -1 when there is no line
 void redraw(ordered_output &out);
 
-// Writes what is finished but waited for inputs that were stopped. Returns the exit status.
+// After the last reply: says what went wrong with the output and that the work was stopped, if it
+// was. Returns the exit status.
 int finish_output(ordered_output &out, bool unclean);
 
 #endif

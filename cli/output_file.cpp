@@ -44,6 +44,13 @@ int rename_without_overwriting(const std::string &from, const std::string &to) {
 
 }  // namespace
 
+bool same_file(const std::string &a, const std::string &b) {
+    struct stat left {};
+    struct stat right {};
+    return stat(a.c_str(), &left) == 0 && stat(b.c_str(), &right) == 0 &&
+           left.st_dev == right.st_dev && left.st_ino == right.st_ino;
+}
+
 std::string check_target(const std::string &target, bool force) {
     struct stat info {};
     if (lstat(target.c_str(), &info) == 0) {

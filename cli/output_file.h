@@ -11,6 +11,9 @@ struct output_file {
     int fd = -1;            // open for writing, -1 once closed
 };
 
+// Whether both paths lead to one existing file.
+bool same_file(const std::string &a, const std::string &b);
+
 // These return an empty string or a sentence that says what failed.
 
 // Whether the target could be written: the folder can be and, without force, the target is not

@@ -9,6 +9,7 @@
 #include "cli/format.h"
 #include "cli/names.h"
 #include "cli/output_file.h"
+#include "cli/plot.h"
 
 namespace {
 
@@ -22,14 +23,24 @@ std::string write_track(record &what, const options &how, const std::string &tar
     return error;
 }
 
-// The analysis and, where the format makes a file of its own, that file. A target that cannot be
-// written is found out before the work is done.
+// The analysis and its picture, when one is wanted. A target that cannot be written is found out
+// before the work is done.
+record analyse_and_draw(const std::string &path, const options &how, int stop_fd) {
+    if (how.plot.empty()) return analyse(path, how, stop_fd);
+    const std::string error = check_plot(how.plot, path, how.force);
+    if (!error.empty()) return failed_record(path, how.mode, error);
+    record out = analyse(path, how, stop_fd);
+    if (out.status == outcome::ok) draw_plot(out, how, stop_fd);
+    return out;
+}
+
+// As above, and the file that the format makes of its own.
 record analyse_and_write(const std::string &path, const options &how, int stop_fd) {
-    if (how.format != result_format::labels) return analyse(path, how, stop_fd);
+    if (how.format != result_format::labels) return analyse_and_draw(path, how, stop_fd);
     const std::string target = label_path(path, how.output_dir);
     std::string error = check_target(target, how.force);
     if (!error.empty()) return failed_record(path, how.mode, error);
-    record out = analyse(path, how, stop_fd);
+    record out = analyse_and_draw(path, how, stop_fd);
     if (out.status != outcome::ok) return out;
     error = write_track(out, how, target);
     if (error.empty()) return out;

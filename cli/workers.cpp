@@ -130,11 +130,10 @@ void bury(pool &run, process &worker) {
     int status = 0;
     while (waitpid(worker.pid, &status, 0) < 0 && errno == EINTR) {
     }
-    const bool clean = WIFEXITED(status) && WEXITSTATUS(status) == 0;
-    if (worker.asked && !(run.ending && clean)) {
+    if (worker.asked) {
         fail_input(run, *worker.asked,
                    "The process that analysed this file was ended " + how_it_ended(status) + ".");
-    } else if (!worker.asked && !clean) {
+    } else if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) {
         run.unclean = true;
         write_message(run.output, "tavo: an analysis process without a file was ended " +
                                       how_it_ended(status) + ".\n");

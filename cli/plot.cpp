@@ -1,0 +1,31 @@
+#include "cli/plot.h"
+
+#include <sys/stat.h>
+
+#include "cli/names.h"
+#include "cli/output_file.h"
+
+std::string check_plot(const std::string &target, const std::string &input, bool force) {
+    if (same_file(target, input)) return "The picture would replace the file that is analysed.";
+    struct stat info {};
+    if (lstat(target.c_str(), &info) == 0 && !S_ISREG(info.st_mode) && !S_ISDIR(info.st_mode)) {
+        return "The picture " + shown(target) + " cannot be written: it is no regular file.";
+    }
+    return check_target(target, force);
+}
+
+void draw_plot(record &what, const options &how, int stop_fd) {
+    plot_data data;
+    std::string error;
+    const outcome read = gather_plot(what, stop_fd, data, error);
+    if (read == outcome::ok) {
+        output_file file;
+        error = begin_output(file, how.plot);
+        if (error.empty()) error = write_output(file, plot_svg(what, data));
+        if (error.empty()) error = commit_output(file, how.force);
+        abandon_output(file);
+        if (error.empty()) return;
+    }
+    what = failed_record(what.file, what.mode, error);
+    if (read == outcome::stopped) what.status = outcome::stopped;
+}

@@ -1,0 +1,47 @@
+// The picture of one file's result: --plot.
+//
+// In: a record (record.h) and the file it is about. Out: an SVG file, whole or not there.
+// draw_plot: after analyse.h, in the worker. gather_plot reads the sound, plot_svg draws.
+#ifndef TAVO_CLI_PLOT_H
+#define TAVO_CLI_PLOT_H
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "cli/options.h"
+#include "cli/record.h"
+
+constexpr int kPlotColumns = 1000;  // pixels of the time axis
+
+// The least and the greatest sample of a stretch.
+struct extent {
+    int16_t low = 0;
+    int16_t high = 0;
+};
+
+struct plot_data {
+    double length_ms = 0.0;        // of the time axis: what was read, and the results
+    double read_ms = 0.0;          // of sound
+    std::vector<extent> waveform;  // one per column from the start; fewer than kPlotColumns when
+                                   // the axis goes on after the sound
+    std::vector<float> loudness;   // value k: over the 6 s that start at 2 k s; none below 6 s
+    double mean = 0.0;             // of loudness
+    int32_t peak = 0;              // greatest magnitude of a sample, 0 to 32768
+};
+
+// Whether the picture could be written and would not replace the input. Makes nothing. Returns an
+// empty string or a sentence.
+std::string check_plot(const std::string &target, const std::string &input, bool force);
+
+// Draws what was found into how.plot. A failure or a stop is entered into the record.
+void draw_plot(record &what, const options &how, int stop_fd);
+
+// Reads the sound of what.file once, from its start. Memory does not grow with the sound, but for
+// the loudness: 4 bytes each 2 s. Where reading fails it ends. stop_fd as for analyse.
+outcome gather_plot(const record &what, int stop_fd, plot_data &out, std::string &error);
+
+// The whole SVG document, UTF-8.
+std::string plot_svg(const record &what, const plot_data &data);
+
+#endif

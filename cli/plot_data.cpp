@@ -1,0 +1,166 @@
+#include <poll.h>
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <cstdlib>
+#include <memory>
+
+#include "cli/library_path.h"
+#include "cli/plot.h"
+#include "core/tavo_ctx.h"
+#include "highlight/power_envelope.h"
+#include "media_source/mtsrc.h"
+
+namespace {
+
+constexpr int32_t kBlockSamples = 4096;  // 8192 bytes: the media source's custom
+constexpr size_t kMostBins = 16384;      // many times the columns: their edges stay sharp
+constexpr int64_t kWindowSeconds = 6;    // of a loudness value
+constexpr int64_t kHopSeconds = 2;       // from one to the next
+
+// Extents of stretches of equal length, which doubles whenever there get to be too many: what the
+// file says of its length need not be true.
+struct bins {
+    std::vector<extent> full;
+    int64_t samples_each = 1;
+    extent open;  // of the stretch under way
+    int64_t open_samples = 0;
+};
+
+struct loudness_curve {
+    std::vector<int16_t> window;
+    size_t filled = 0;
+    size_t hop = 0;  // samples
+    std::vector<float> values;
+};
+
+extent joined(const extent &a, const extent &b) {
+    return {std::min(a.low, b.low), std::max(a.high, b.high)};
+}
+
+void close_bin(bins &to) {
+    to.full.push_back(to.open);
+    to.open_samples = 0;
+    if (to.full.size() < kMostBins) return;
+    for (size_t i = 0; i < kMostBins / 2; ++i) {
+        to.full[i] = joined(to.full[2 * i], to.full[2 * i + 1]);
+    }
+    to.full.resize(kMostBins / 2);
+    to.samples_each *= 2;
+}
+
+void add_samples(bins &to, const int16_t *pcm, size_t count) {
+    for (size_t i = 0; i < count; ++i) {
+        const extent one = {pcm[i], pcm[i]};
+        to.open = to.open_samples == 0 ? one : joined(to.open, one);
+        if (++to.open_samples == to.samples_each) close_bin(to);
+    }
+}
+
+// The library's own curve, window by window: the values are those of the sound taken whole.
+void add_samples(loudness_curve &to, const int16_t *pcm, size_t count, int32_t rate) {
+    while (count > 0) {
+        const size_t taken = std::min(count, to.window.size() - to.filled);
+        std::copy(pcm, pcm + taken, to.window.data() + to.filled);
+        to.filled += taken;
+        pcm += taken;
+        count -= taken;
+        if (to.filled < to.window.size()) return;
+        TAVO_HL_CTX curve{};
+        const int64_t size = static_cast<int64_t>(to.window.size());
+        const int32_t made = _calc_power_level(to.window.data(), size, rate, &curve);
+        const std::unique_ptr<float, decltype(&free)> owner(curve.power, free);
+        if (made != 1) throw std::bad_alloc();
+        to.values.push_back(curve.power[0]);
+        std::copy(to.window.begin() + static_cast<ptrdiff_t>(to.hop), to.window.end(),
+                  to.window.begin());
+        to.filled -= to.hop;
+    }
+}
+
+bool stop_asked(int stop_fd) {
+    pollfd watched = {stop_fd, POLLIN, 0};
+    return poll(&watched, 1, 0) > 0;
+}
+
+struct reading {
+    bins waveform;
+    loudness_curve loudness;
+    int64_t samples = 0;
+};
+
+outcome read_sound(mtsrc_ctx *source, int32_t rate, int stop_fd, reading &to) {
+    to.loudness.window.resize(static_cast<size_t>(kWindowSeconds * rate));
+    to.loudness.hop = static_cast<size_t>(kHopSeconds * rate);
+    std::array<int16_t, kBlockSamples> block{};
+    for (int32_t code = 0; code == 0;) {
+        if (stop_asked(stop_fd)) return outcome::stopped;
+        mtsrc_frame frame = {block.data(), 0};
+        code = mtsrc_getstream(source, static_cast<int32_t>(sizeof(block)), &frame);
+        if (code < 0 || frame.size <= 0) break;
+        const size_t count = static_cast<size_t>(frame.size) / sizeof(int16_t);
+        add_samples(to.waveform, block.data(), count);
+        add_samples(to.loudness, block.data(), count, rate);
+        to.samples += static_cast<int64_t>(count);
+    }
+    if (to.waveform.open_samples > 0) to.waveform.full.push_back(to.waveform.open);
+    return outcome::ok;
+}
+
+// Each column takes every bin that it touches.
+std::vector<extent> columns_of(const bins &from, double axis_samples) {
+    std::vector<extent> out;
+    const double bins_each = axis_samples / kPlotColumns / static_cast<double>(from.samples_each);
+    for (int k = 0; k < kPlotColumns; ++k) {
+        const size_t first = static_cast<size_t>(k * bins_each);
+        if (first >= from.full.size()) break;
+        const size_t end = static_cast<size_t>(std::ceil((k + 1) * bins_each));
+        extent column = from.full[first];
+        for (size_t i = first + 1; i < std::min(end, from.full.size()); ++i) {
+            column = joined(column, from.full[i]);
+        }
+        out.push_back(column);
+    }
+    return out;
+}
+
+void fill_plot(const record &what, const reading &from, int32_t rate, plot_data &out) {
+    out.read_ms = 1000.0 * static_cast<double>(from.samples) / rate;
+    out.length_ms = std::max(out.read_ms, static_cast<double>(what.hl_pos_ms));
+    for (const float beat : what.beats_ms) {
+        out.length_ms = std::max(out.length_ms, static_cast<double>(beat));
+    }
+    out.waveform = columns_of(from.waveform, out.length_ms * rate / 1000.0);
+    for (const extent &column : out.waveform) {
+        out.peak = std::max(
+            {out.peak, -static_cast<int32_t>(column.low), static_cast<int32_t>(column.high)});
+    }
+    out.loudness = from.loudness.values;
+    double sum = 0.0;
+    for (const float value : out.loudness) sum += static_cast<double>(value);
+    if (!out.loudness.empty()) out.mean = sum / static_cast<double>(out.loudness.size());
+}
+
+}  // namespace
+
+outcome gather_plot(const record &what, int stop_fd, plot_data &out, std::string &error) {
+    library_path opened = open_library_path(what.file);
+    const mtsrc_param param{opened.path.c_str()};
+    int32_t code = 0;
+    const std::unique_ptr<mtsrc_ctx, decltype(&mtsrc_deinit)> source(mtsrc_init(&param, &code),
+                                                                     mtsrc_deinit);
+    close_library_path(opened);
+    reading from;
+    outcome end = outcome::failed;
+    if (source != nullptr) end = read_sound(source.get(), what.sample_rate, stop_fd, from);
+    if (end == outcome::stopped) {
+        error = "The analysis was stopped.";
+    } else if (from.samples == 0) {
+        error = "The sound could not be read again for the picture.";
+        end = outcome::failed;
+    } else {
+        fill_plot(what, from, what.sample_rate, out);
+    }
+    return end;
+}

@@ -1,0 +1,37 @@
+// Elements of SVG as text, for plot_svg.cpp. Attributes alone, no style sheets and no fonts of its
+// own: every viewer shows the same.
+#ifndef TAVO_CLI_SVG_H
+#define TAVO_CLI_SVG_H
+
+#include <string>
+#include <utility>
+#include <vector>
+
+typedef std::vector<std::pair<const char *, std::string>> attributes;  // values are escaped already
+
+// With a point, whatever the locale of the user.
+std::string decimal(double value, int digits);
+std::string point(double x, double y);
+
+// Text for an element: escaped, and what XML does not have becomes U+FFFD, as bytes that are no
+// characters do.
+std::string xml(const std::string &bytes);
+
+// The start of an element, up to before its closing bracket; a whole one without content.
+std::string opened(const char *name, const attributes &with);
+std::string element(const char *name, const attributes &with);
+
+// anchor: start, middle or end. content: from xml().
+std::string text_at(double x, double y, const char *anchor, const std::string &content);
+
+// A path that is not filled.
+std::string stroke(const char *id, const char *colour, double width, const std::string &path);
+
+// dashes: lengths on and off, "none" for a solid line.
+attributes line(double x1, double y1, double x2, double y2, const char *colour, double width,
+                const char *dashes);
+
+// A line with a name.
+std::string named_line(const char *id, attributes with);
+
+#endif
