@@ -21,8 +21,8 @@ struct aac_decoder {
     int32_t output_channels;  // 0: the stream's own
 };
 
-// Decodes every frame of the bundle. Returns false when the decoder cannot be opened or the frame
-// is none of the reader's.
+// Decodes every frame of the bundle. Returns false when the decoder cannot be opened, the frame is
+// none of the reader's, or out of memory.
 bool decode_bundle(aac_decoder *d, const wexa_frame *frame, bundle_view *view,
                    int32_t *last_samples) {
     *last_samples = 0;
@@ -41,6 +41,9 @@ bool decode_bundle(aac_decoder *d, const wexa_frame *frame, bundle_view *view,
     for (const uint8_t *block = bundle_next(view, &bytes); block != nullptr;
          block = bundle_next(view, &bytes)) {
         *last_samples = av_decoder_decode(&d->av, block, bytes);
+        if (*last_samples == kAvNoMemory) {
+            return false;
+        }
     }
     return true;
 }
@@ -81,7 +84,10 @@ int32_t xaacd_decode(void *decoder, const wexa_frame *frame, wexa_output *output
     const int32_t own = std::clamp(d->output_channels > 0 ? d->output_channels : view.head.channels,
                                    1, kMaxChannels);
     const int32_t samples = view.head.samples;
-    if (output->data == nullptr || samples <= 0 ||
+    if (samples == 0) {
+        return 0;  // decoded for the state
+    }
+    if (output->data == nullptr || samples < 0 ||
         samples > kAacFrameBuffer / (own * kSampleBytes)) {
         return -1;
     }

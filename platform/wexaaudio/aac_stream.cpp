@@ -16,43 +16,22 @@ constexpr int32_t kLearnFrames = 64;  // frames tried until one decodes at all
 
 constexpr int32_t kMaxFrameSamples = 4096;  // as 16-bit pairs well within the frame buffer
 
-struct group_plan {
-    int32_t preroll;
-    int32_t group;
-};
+// Opening a decoder costs as much as decoding several frames, which speaks for large groups; a seek
+// decodes half a group on average, which speaks for small ones.
+//
+// One frame settles the overlap of low complexity. Band replication has filters and envelopes with
+// a longer memory, and its set-up may come with every tenth frame only: 8 frames can be heard.
+constexpr int32_t kGroup = 256;
+constexpr int32_t kPreroll = 1;
+constexpr int32_t kLongPreroll = 12;
 
-// Opening a decoder costs as much as decoding several frames, so the largest groups that fit the
-// frame buffer are taken. One frame of pre-roll settles the overlap of low complexity. Band
-// replication has filters and envelopes with a longer memory: 8 frames of pre-roll can be heard.
-constexpr group_plan kPlans[] = {{1, 64}, {1, 48}, {1, 32}, {1, 24}, {1, 16},
-                                 {1, 8},  {1, 4},  {1, 2},  {1, 1}};
-constexpr group_plan kSbrPlans[] = {{12, 64}, {12, 48}, {12, 32}, {12, 24}, {12, 16}, {12, 8},
-                                    {12, 4},  {8, 4},   {4, 4},   {4, 2},   {2, 1},   {1, 1}};
+constexpr int32_t kMaxBlockBytes = 8191;  // what an ADTS header can state, beyond any real block
 
-// True when each group's longest bundle fits the frame buffer.
-bool fits(const aac_stream *s, group_plan plan) {
-    const int64_t frames = s->index.count;
-    for (int64_t start = 0; start < frames; start += plan.group) {
-        const int64_t from = std::max<int64_t>(start - plan.preroll, 0);
-        const int64_t to = std::min(start + plan.group, frames);
-        int64_t payload = 0;
-        for (int64_t i = from; i < to; ++i) {
-            payload += s->index.entry[i].bytes;
-        }
-        if (bundle_size(s->config.size, static_cast<int32_t>(to - from), payload) >
-            kAacFrameBuffer) {
-            return false;
-        }
-    }
-    return true;
-}
-
-template <size_t N>
-void choose_plan(aac_stream *s, const group_plan (&plans)[N]) {
-    const group_plan *plan =
-        std::find_if(plans, plans + N - 1, [s](group_plan p) { return fits(s, p); });
-    s->preroll = plan->preroll;  // the last one is taken without a test: what does not fit even
-    s->group = plan->group;      // there is handed out as silence
+// Goes back to where the group of the next frame starts a decoder.
+void start_group(aac_stream *s) {
+    s->fresh = true;
+    s->feed =
+        s->group > 0 ? std::max<int64_t>(s->next - s->next % s->group - s->preroll, 0) : s->next;
 }
 
 // Decodes frame k alone with a fresh decoder. Returns the sample frames that d then holds.
@@ -107,62 +86,58 @@ bool aac_stream_learn(aac_stream *s) {
     }
     int64_t first = 0;
     for (int64_t i = 0; i < s->index.count; ++i) {
-        s->index.entry[i].first = first;
-        s->index.entry[i].samples = s->frame_samples;
+        frame_entry &entry = s->index.entry[i];
+        entry.first = first;
+        entry.samples = s->frame_samples;
+        entry.bytes = entry.bytes <= kMaxBlockBytes ? entry.bytes : 0;
         first += s->frame_samples;
     }
-    // Prediction and long windows of the other object types remember more than one frame as well.
-    if (s->config.object_type == kAacLowComplexity) {
-        choose_plan(s, kPlans);
-    } else {
-        choose_plan(s, kSbrPlans);
-    }
-    s->next = 0;
-    s->fresh = true;
+    // The prediction of other object types remembers more than one frame as well.
+    const bool plain = s->config.object_type == kAacLowComplexity && !sbr;
+    s->group = kGroup;
+    s->preroll = plain ? kPreroll : kLongPreroll;
+    start_group(s);
     return true;
+}
+
+void aac_stream_advance(aac_stream *s) {
+    ++s->next;
+    s->skip = 0;
+    s->feed = s->next;
+    if (s->group > 0 && s->next % s->group == 0) {
+        start_group(s);
+    }
 }
 
 int32_t aac_stream_read(aac_stream *s, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                         int64_t *second) {
-    const int64_t k = s->next;
-    if (k >= s->index.count) {
+    if (s->next >= s->index.count) {
         return 1;
     }
-    const int64_t start = k / s->group * s->group;
-    const bool fresh = s->fresh || k == start;
-    const int64_t from = fresh ? std::max<int64_t>(start - s->preroll, 0) : k;
-    int64_t payload = 0;
-    for (int64_t i = from; i <= k; ++i) {
-        payload += s->index.entry[i].bytes;
-    }
-    bundle_head head = {{},
-                        fresh ? kBundleFresh : 0,
-                        s->channels,
-                        s->frame_samples,
-                        0,
-                        s->config.size,
-                        static_cast<int32_t>(k - from + 1)};
-    if (bundle_size(head.setup, head.frames, payload) > size) {
-        head.frames = 0;
-    }
+    const frame_entry entry = s->index.entry[s->feed];
+    const bool heard = s->feed == s->next;
+    bundle_head head = {};
+    head.flags = s->fresh ? kBundleFresh : 0;
+    head.channels = s->channels;
+    head.samples = heard ? s->frame_samples - s->skip : 0;
+    head.skip = heard ? s->skip : 0;
+    head.setup = s->config.size;
+    head.frames = 1;
     bundle_writer w;
     bundle_begin(&w, buf, size, head, s->config.bytes);
-    for (int64_t i = from; i <= k && head.frames > 0; ++i) {
-        const frame_entry entry = s->index.entry[i];
-        uint8_t *space = bundle_add(&w, entry.bytes);
-        if (space == nullptr ||
-            io_file_read(s->file, entry.offset, space, entry.bytes) != entry.bytes) {
-            return -1;
-        }
-    }
-    *bytes = bundle_end(&w);
-    if (*bytes < 0) {
+    uint8_t *space = bundle_add(&w, entry.bytes);
+    if (space == nullptr ||
+        io_file_read(s->file, entry.offset, space, entry.bytes) != entry.bytes) {
         return -1;
     }
-    *first = units_from_samples(s->index.entry[k].first, s->sample_rate);
-    *second = units_from_samples(s->frame_samples, s->sample_rate);
+    *bytes = bundle_end(&w);
+    *first = units_from_samples(entry.first + head.skip, s->sample_rate);
+    *second = units_from_samples(head.samples, s->sample_rate);
     s->fresh = false;
-    ++s->next;
+    ++s->feed;
+    if (heard) {
+        aac_stream_advance(s);
+    }
     return 0;
 }
 
@@ -170,19 +145,17 @@ int32_t aac_stream_seek(aac_stream *s, int64_t position, int64_t *reached) {
     if (s->index.count == 0) {
         return -1;
     }
-    const int64_t sample = samples_from_units(std::max<int64_t>(position, 0), s->sample_rate);
-    int64_t k = frame_index_find(&s->index, sample);
-    if (s->index.entry[k].first < sample && k + 1 < s->index.count) {
-        ++k;
-    }
-    s->next = k;
-    s->fresh = true;
-    *reached = units_from_samples(s->index.entry[k].first, s->sample_rate);
+    const int64_t end = frame_index_end(&s->index);
+    const int64_t sample = seek_target(position, end, s->sample_rate);
+    s->next = sample < end ? frame_index_find(&s->index, sample) : s->index.count;
+    s->skip = sample < end ? static_cast<int32_t>(sample - s->index.entry[s->next].first) : 0;
+    start_group(s);
+    *reached = units_from_samples(sample, s->sample_rate);
     return 0;
 }
 
 int64_t aac_stream_duration(const aac_stream *s) {
-    return units_from_samples(frame_index_end(&s->index), s->sample_rate);
+    return units_of_duration(frame_index_end(&s->index), s->sample_rate);
 }
 
 void aac_stream_free(aac_stream *s) {

@@ -102,6 +102,12 @@ bool convert_channels(const AVFrame *frame, int32_t skip, int32_t count, int32_t
 
 bool convert_mean(const AVFrame *frame, int32_t skip, int32_t count, int16_t *out) {
     const int32_t channels = frame->ch_layout.nb_channels;
+    if (frame->format == AV_SAMPLE_FMT_FLTP && channels == 2) {
+        pcm16_mean_from_float(reinterpret_cast<const float *>(frame->extended_data[0]) + skip,
+                              reinterpret_cast<const float *>(frame->extended_data[1]) + skip, out,
+                              count);
+        return true;
+    }
     int16_t one[kMixBlock];
     int32_t sum[kMixBlock];
     for (int32_t done = 0; done < count; done += kMixBlock) {

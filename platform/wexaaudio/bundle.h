@@ -22,7 +22,7 @@ struct bundle_head {
     int32_t flags;     // kBundle*
     int32_t channels;  // of the output; 0: the decoder's own choice
     int32_t samples;   // sample frames of the output, silence where the last frame gives fewer;
-                       // negative: whatever it decodes to
+                       // 0: the frames are decoded for the decoder's state alone
     int32_t skip;      // sample frames cut from the front of the last frame's output
     int32_t setup;     // bytes of set-up data
     int32_t frames;    // may be 0: silence

@@ -33,8 +33,9 @@ bool open_with(flac_decoder *d, const void *info) {
     return av_decoder_open(&d->av, "flac", &setup);
 }
 
-int32_t take_pcm(const flac_decoder *d, void *pcm, int32_t capacity) {
-    return av_decoder_pcm(&d->av, d->channels == 1 ? kAvMean : kAvFront, 0, 0, -1, pcm, capacity);
+int32_t take_pcm(const flac_decoder *d, int32_t skip, void *pcm, int32_t capacity) {
+    const av_channels policy = d->channels == 1 ? kAvMean : kAvFront;
+    return av_decoder_pcm(&d->av, policy, 0, skip, -1, pcm, capacity);
 }
 
 // PCM that the reader made: pairs, kept or averaged.
@@ -71,7 +72,7 @@ int32_t decode_bundle(flac_decoder *d, bundle_view *v, void *pcm) {
         if (held == kAvNoMemory) {
             return -1;
         }
-        written = held > 0 ? std::max(take_pcm(d, pcm, wanted), 0) : 0;
+        written = held > 0 ? std::max(take_pcm(d, v->head.skip, pcm, wanted), 0) : 0;
     }
     memset(static_cast<uint8_t *>(pcm) + written, 0, static_cast<size_t>(wanted - written));
     return wanted;
@@ -81,7 +82,7 @@ int32_t decode_bare(flac_decoder *d, const wexa_frame *frame, void *pcm) {
     if (!open_with(d, nullptr) || av_decoder_decode(&d->av, frame->data, frame->bytes) < 0) {
         return -1;
     }
-    return take_pcm(d, pcm, kMaxPcm);
+    return take_pcm(d, 0, pcm, kMaxPcm);
 }
 
 }  // namespace

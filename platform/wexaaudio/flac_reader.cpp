@@ -27,6 +27,7 @@ struct flac_reader {
     flac_stream stream;
     wexa_tags *tags;
     int64_t next;       // frame read next
+    int32_t skip;       // sample frames cut from its front
     av_decoder av;      // for frames decoded here; opened when one is met
     uint8_t *big;       // a compressed frame decoded here, owned
     uint8_t *pcm;       // [pcm_total][2] its PCM, owned; null when none is being handed out
@@ -85,7 +86,7 @@ bool start_pcm(flac_reader *r, const frame_entry &entry) {
     const int32_t bytes = entry.samples * kSampleFrame;
     r->pcm = static_cast<uint8_t *>(calloc(static_cast<size_t>(entry.samples), kSampleFrame));
     r->pcm_total = entry.samples;
-    r->pcm_done = 0;
+    r->pcm_done = r->skip;
     if (r->pcm == nullptr) {
         return false;
     }
@@ -124,7 +125,8 @@ int32_t write_frame(flac_reader *r, const frame_entry &entry, void *buf, int32_t
     bundle_head head = {};
     head.flags = entry.bytes == 0 ? kBundleLost : 0;
     head.channels = kChannels;
-    head.samples = entry.samples;
+    head.samples = entry.samples - r->skip;
+    head.skip = r->skip;
     head.setup = kFlacInfoBytes;
     head.frames = entry.bytes == 0 ? 0 : 1;
     bundle_writer w = {};
@@ -173,7 +175,7 @@ void *xflacfd_create(const mtsrc_io *io, int64_t * /*word*/, xflac_info *info,
     settle_last(r);
     read_tags(r);
     info->sample_rate = r->stream.first.rate;
-    info->duration = units_from_samples(frame_index_end(&r->stream.index), r->stream.first.rate);
+    info->duration = units_of_duration(frame_index_end(&r->stream.index), r->stream.first.rate);
     info->tags = r->tags;
     return r;
 }
@@ -188,13 +190,13 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
         return 1;
     }
     const frame_entry &entry = r->stream.index.entry[r->next];
-    const int32_t before = r->pcm != nullptr ? r->pcm_done : 0;
+    const int32_t before = r->pcm != nullptr ? r->pcm_done : r->skip;
     const int32_t got = write_next(r, entry, buf, size);
     if (got <= 0) {
         return got < 0 ? -1 : 1;
     }
     const int32_t rate = r->stream.first.rate;
-    const int32_t samples = r->pcm != nullptr ? r->pcm_done - before : entry.samples;
+    const int32_t samples = r->pcm != nullptr ? r->pcm_done - before : entry.samples - before;
     *bytes = got;
     if (first != nullptr) {
         *first = units_from_samples(entry.first + before, rate);
@@ -204,6 +206,7 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     }
     if (r->pcm == nullptr || r->pcm_done == r->pcm_total) {
         drop_pcm(r);
+        r->skip = 0;
         ++r->next;
     }
     return 0;
@@ -217,10 +220,11 @@ int32_t xflacfd_seek(void *reader, const int64_t *position, int64_t *reached) {
     const frame_index *index = &r->stream.index;
     const int32_t rate = r->stream.first.rate;
     const int64_t end = frame_index_end(index);
-    const int64_t wanted = samples_from_units(std::max<int64_t>(*position, 0), rate);
+    const int64_t sample = seek_target(*position, end, rate);
     drop_pcm(r);
-    r->next = wanted < end ? frame_index_find(index, wanted) : index->count;
-    *reached = units_from_samples(wanted < end ? index->entry[r->next].first : end, rate);
+    r->next = sample < end ? frame_index_find(index, sample) : index->count;
+    r->skip = sample < end ? static_cast<int32_t>(sample - index->entry[r->next].first) : 0;
+    *reached = units_from_samples(sample, rate);
     return 0;
 }
 

@@ -43,7 +43,7 @@ bool learn_mpeg(aac_stream *s) {
     s->sample_rate = h.rate;
     s->channels = h.channels;
     s->frame_samples = h.samples;
-    s->fresh = true;
+    s->fresh = true;  // group stays 0: each seek finds its own pre-roll
     int64_t first = 0;
     for (int64_t k = 0; k < s->index.count; ++k) {
         s->index.entry[k].first = first;
@@ -84,15 +84,15 @@ int32_t read_mpeg(aac_stream *s, void *buf, int32_t size, int32_t *bytes, int64_
         return 1;
     }
     const int32_t got =
-        mpeg_frames_read(s->file, &s->index, s->next, s->fresh, s->channels, buf, size);
+        mpeg_frames_read(s->file, &s->index, s->next, s->fresh, s->skip, s->channels, buf, size);
     if (got <= 0) {
         return got == 0 ? 1 : -1;
     }
     *bytes = got;
-    *first = units_from_samples(s->index.entry[s->next].first, s->sample_rate);
-    *second = units_from_samples(s->frame_samples, s->sample_rate);
+    *first = units_from_samples(s->index.entry[s->next].first + s->skip, s->sample_rate);
+    *second = units_from_samples(s->frame_samples - s->skip, s->sample_rate);
     s->fresh = false;
-    ++s->next;
+    aac_stream_advance(s);
     return 0;
 }
 

@@ -48,7 +48,7 @@ int32_t decode_bundle(mpeg_decoder *d, bundle_view *v, void *pcm) {
                            channels * kSampleBytes;
     int32_t written = 0;
     if (held > 0 && (v->head.flags & kBundleLost) == 0) {
-        written = av_decoder_pcm(&d->av, kAvOwn, channels, 0, -1, pcm, wanted);
+        written = av_decoder_pcm(&d->av, kAvOwn, channels, v->head.skip, -1, pcm, wanted);
     }
     written = std::max(written, 0);
     memset(static_cast<uint8_t *>(pcm) + written, 0, static_cast<size_t>(wanted - written));

@@ -85,13 +85,14 @@ span fit(const frame_index *index, int64_t first, int64_t n, int32_t size) {
 }  // namespace
 
 int32_t mpeg_frames_read(io_file *file, const frame_index *index, int64_t n, bool fresh,
-                         int32_t channels, void *buf, int32_t size) {
+                         int32_t skip, int32_t channels, void *buf, int32_t size) {
     const frame_entry &wanted = index->entry[n];
     const span s = fit(index, fresh ? first_needed(file, index, n) : n, n, size);
     bundle_head head = {};
     head.flags = (fresh ? kBundleFresh : 0) | (wanted.bytes == 0 ? kBundleLost : 0);
     head.channels = channels;
-    head.samples = wanted.samples;
+    head.samples = wanted.samples - skip;
+    head.skip = skip;
     head.frames = s.frames;
     bundle_writer w = {};
     bundle_begin(&w, buf, size, head, nullptr);

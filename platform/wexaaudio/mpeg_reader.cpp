@@ -1,7 +1,9 @@
 // Bare MPEG audio files: open, frame by frame, exact seeks.
 //
-// Times count the PCM that the source delivers. Of a 44.1-kHz stereo stream it drops the start of
-// the first frame, so every later frame is reported that much earlier than it is decoded.
+// Positions of seeks and the duration count the PCM that the source delivers. Of a 44.1-kHz stereo
+// stream it drops the start of the first frame, so a sample lies that much later in what is
+// decoded. The times that come with the frames count what is decoded: 0 marks the first frame,
+// whole.
 #include <algorithm>
 #include <cstdlib>
 
@@ -23,6 +25,7 @@ struct mpeg_reader {
     wexa_tags *tags;
     int64_t dropped;  // sample frames that the source drops at the start
     int64_t next;     // frame read next
+    int32_t skip;     // sample frames cut from its front
     bool fresh;       // a seek came before it
 };
 
@@ -38,11 +41,9 @@ void read_tags(mpeg_reader *r) {
     }
 }
 
-// Sample frames delivered before frame n.
-int64_t delivered_before(const mpeg_reader *r, int64_t n) {
-    const int64_t decoded = n < r->stream.index.count ? r->stream.index.entry[n].first
-                                                      : frame_index_end(&r->stream.index);
-    return std::max<int64_t>(decoded - r->dropped, 0);
+// Sample frames that the source delivers in all.
+int64_t delivered(const mpeg_reader *r) {
+    return std::max<int64_t>(frame_index_end(&r->stream.index) - r->dropped, 0);
 }
 
 }  // namespace
@@ -68,7 +69,7 @@ void *xmp123fd_create(const mtsrc_io *io, int64_t * /*word*/, xmp123_info *info,
     read_tags(r);
     info->sample_rate = head.rate;
     info->channels = head.channels;
-    info->duration = units_from_samples(delivered_before(r, r->stream.index.count), head.rate);
+    info->duration = units_of_duration(delivered(r), head.rate);
     info->tags = r->tags;
     return r;
 }
@@ -83,20 +84,21 @@ int32_t xmp123fd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, 
         return 1;
     }
     const mpeg_header &head = r->stream.head;
-    const int32_t got =
-        mpeg_frames_read(&r->file, &r->stream.index, r->next, r->fresh, head.channels, buf, size);
+    const int32_t got = mpeg_frames_read(&r->file, &r->stream.index, r->next, r->fresh, r->skip,
+                                         head.channels, buf, size);
     if (got <= 0) {
         return got < 0 ? -1 : 1;
     }
     const frame_entry &entry = r->stream.index.entry[r->next];
     *bytes = got;
     if (first != nullptr) {
-        *first = units_from_samples(entry.first, head.rate);
+        *first = units_from_samples(entry.first + r->skip, head.rate);
     }
     if (second != nullptr) {
-        *second = units_from_samples(entry.samples, head.rate);
+        *second = units_from_samples(entry.samples - r->skip, head.rate);
     }
     ++r->next;
+    r->skip = 0;
     r->fresh = false;
     return 0;
 }
@@ -108,10 +110,15 @@ int32_t xmp123fd_seek(void *reader, const int64_t *position, int64_t *reached) {
     }
     const frame_index *index = &r->stream.index;
     const int32_t rate = r->stream.head.rate;
-    const int64_t wanted = samples_from_units(std::max<int64_t>(*position, 0), rate) + r->dropped;
-    r->next = wanted < frame_index_end(index) ? frame_index_find(index, wanted) : index->count;
+    const int64_t end = delivered(r);
+    const int64_t sample = seek_target(*position, end, rate);
+    // At the start the source drops; anywhere else, in the first frame too, the frame's time is not
+    // 0, so that nothing is dropped twice.
+    const int64_t decoded = sample > 0 ? sample + r->dropped : 0;
+    r->next = sample < end ? frame_index_find(index, decoded) : index->count;
+    r->skip = sample < end ? static_cast<int32_t>(decoded - index->entry[r->next].first) : 0;
     r->fresh = true;
-    *reached = units_from_samples(delivered_before(r, r->next), rate);
+    *reached = units_from_samples(sample, rate);
     return 0;
 }
 

@@ -22,8 +22,9 @@ struct ogg_demux {
     wexa_tags *tags;  // owned
     ogg_index index;
     int64_t next;    // packet to be handed out next
-    int32_t inside;  // sample frames of it already given, of a hole
+    int32_t inside;  // sample frames at its front already given, of a hole, or cut off by a seek
     bool fresh;      // the next packet starts a decoder
+    bool primed;     // and the one before it has just been handed out to that end
 };
 
 // The packet at or after k that has audio, the count of packets when there is none.
@@ -34,33 +35,28 @@ int64_t with_audio(const frame_index *packets, int64_t k) {
     return k;
 }
 
-// Hands out packet k, with the one before it when the decoder starts here. Returns the bytes
-// written, -1 when the file cannot be read. A packet that does not fit becomes silence.
-int32_t write_packet(ogg_demux *d, int64_t k, void *buf, int32_t size) {
-    const frame_entry *entry = d->index.packets.entry;
-    // Behind a packet that only primes, or nothing usable, a linear read starts afresh as well.
-    const bool fresh = d->fresh || k == 0 || entry[k - 1].samples == 0;
-    const int64_t from = fresh && k > 0 && entry[k - 1].bytes > 0 ? k - 1 : k;
-    int64_t payload = 0;
-    for (int64_t i = from; i <= k; ++i) {
-        payload += entry[i].bytes;
-    }
+// Hands out packet k for samples sample frames of its output, inside frames from its front on.
+// Returns the bytes written, -1 when the file cannot be read. A packet that does not fit becomes
+// silence.
+int32_t write_packet(ogg_demux *d, int64_t k, bool fresh, int32_t inside, int32_t samples,
+                     void *buf, int32_t size) {
+    const frame_entry entry = d->index.packets.entry[k];
     bundle_head head = {};
     head.flags = fresh ? kBundleFresh : 0;
     head.channels = d->index.setup.channels;
-    head.samples = entry[k].samples;
-    head.skip = k == d->index.cut_packet ? d->index.cut_samples : 0;
-    head.frames = static_cast<int32_t>(k - from + 1);
-    if (bundle_size(0, head.frames, payload) > size) {
+    head.samples = samples;
+    head.skip = inside + (k == d->index.cut_packet ? d->index.cut_samples : 0);
+    head.frames = 1;
+    if (bundle_size(0, head.frames, entry.bytes) > size) {
         head.frames = 0;
         head.flags = kBundleFresh;
     }
     bundle_writer w;
     bundle_begin(&w, buf, size, head, nullptr);
-    for (int64_t i = from; i <= k && head.frames > 0; ++i) {
-        uint8_t *space = bundle_add(&w, entry[i].bytes);
+    if (head.frames > 0) {
+        uint8_t *space = bundle_add(&w, entry.bytes);
         if (space == nullptr ||
-            !ogg_index_copy(&d->index, &d->file, entry[i].offset, space, entry[i].bytes)) {
+            !ogg_index_copy(&d->index, &d->file, entry.offset, space, entry.bytes)) {
             return -1;
         }
     }
@@ -75,6 +71,27 @@ int32_t write_silence(const ogg_demux *d, int32_t samples, void *buf, int32_t si
     bundle_writer w;
     bundle_begin(&w, buf, size, head, nullptr);
     return bundle_end(&w);
+}
+
+// Hands out what comes next of packet k: silence of a hole, the packet before it that a decoder
+// starts with, or itself. *samples: sample frames that it will give.
+int32_t write_next(ogg_demux *d, int64_t k, int32_t inside, void *buf, int32_t size,
+                   int32_t *samples) {
+    const frame_entry *entry = d->index.packets.entry;
+    const int32_t left = entry[k].samples - inside;
+    if (entry[k].bytes == 0) {
+        *samples = std::min(left, kSilenceSamples);
+        d->fresh = true;
+        d->primed = false;
+        return write_silence(d, *samples, buf, size);
+    }
+    // Behind a packet that only primes, or nothing usable, a linear read starts afresh as well.
+    const bool fresh = !d->primed && (d->fresh || k == 0 || entry[k - 1].samples == 0);
+    d->primed = fresh && k > 0 && entry[k - 1].bytes > 0;
+    d->fresh = false;
+    *samples = d->primed ? 0 : left;
+    return d->primed ? write_packet(d, k - 1, true, 0, 0, buf, size)
+                     : write_packet(d, k, fresh, inside, left, buf, size);
 }
 
 }  // namespace
@@ -97,7 +114,7 @@ void *xoggd_create(const mtsrc_io *io, int64_t * /*word*/, xogg_info *info, void
     memcpy(info->kind, d->index.kind, sizeof info->kind);
     if (d->index.codec == kOggVorbis) {
         info->duration =
-            units_from_samples(frame_index_end(&d->index.packets), d->index.setup.sample_rate);
+            units_of_duration(frame_index_end(&d->index.packets), d->index.setup.sample_rate);
     }
     info->tags = d->tags;
     return d;
@@ -154,24 +171,20 @@ int32_t xoggds_get_frm(void *stream, void *buf, int32_t size, int32_t *bytes, in
     if (k >= packets->count) {
         return 1;
     }
-    const frame_entry &entry = packets->entry[k];
-    const bool hole = entry.bytes == 0;
     const int32_t inside = k == d->next ? d->inside : 0;
-    const int32_t samples =
-        hole ? std::min(entry.samples - inside, kSilenceSamples) : entry.samples;
-    const int32_t written =
-        hole ? write_silence(d, samples, buf, size) : write_packet(d, k, buf, size);
+    int32_t samples = 0;
+    const int32_t written = write_next(d, k, inside, buf, size, &samples);
     if (written < 0) {
         return -1;
     }
+    const frame_entry &entry = packets->entry[k];
     const int32_t rate = d->index.setup.sample_rate;
     *bytes = written;
     *first = units_from_samples(entry.first + inside, rate);
     *second = units_from_samples(samples, rate);
-    const bool done = !hole || inside + samples == entry.samples;
+    const bool done = inside + samples == entry.samples;
     d->next = done ? k + 1 : k;
     d->inside = done ? 0 : inside + samples;
-    d->fresh = hole;
     return 0;
 }
 
@@ -183,17 +196,13 @@ int32_t xoggds_seek(void *stream, const int64_t *position, int64_t *reached, int
     }
     const frame_index *packets = &d->index.packets;
     const int32_t rate = d->index.setup.sample_rate;
-    const int64_t sample = samples_from_units(std::max<int64_t>(*position, 0), rate);
-    int64_t k = frame_index_find(packets, sample);
-    const frame_entry &found = packets->entry[k];
-    d->inside = 0;
-    if (found.bytes == 0 && sample < found.first + found.samples) {
-        d->inside = static_cast<int32_t>(std::max<int64_t>(sample - found.first, 0));
-    } else if (found.first < sample && with_audio(packets, k + 1) < packets->count) {
-        k = with_audio(packets, k + 1);
-    }
+    const int64_t end = frame_index_end(packets);
+    const int64_t sample = seek_target(*position, end, rate);
+    const int64_t k = sample < end ? frame_index_find(packets, sample) : packets->count;
     d->next = k;
+    d->inside = sample < end ? static_cast<int32_t>(sample - packets->entry[k].first) : 0;
     d->fresh = true;
-    *reached = units_from_samples(packets->entry[k].first + d->inside, rate);
+    d->primed = false;
+    *reached = units_from_samples(sample, rate);
     return 0;
 }

@@ -55,3 +55,9 @@ void pcm16_pair_from_float(const float *left, const float *right, int16_t *out, 
         out[2 * i + 1] = round_clip(right[i]);
     }
 }
+
+void pcm16_mean_from_float(const float *left, const float *right, int16_t *out, int32_t count) {
+    for (ptrdiff_t i = 0; i < count; ++i) {
+        out[i] = static_cast<int16_t>((round_clip(left[i]) + round_clip(right[i])) / 2);
+    }
+}

@@ -2,7 +2,8 @@
 // stream's.
 //
 // A packet that does not decode comes out as silence of its own length, and so does the next one,
-// which has nothing to overlap with: decoding fails only when the decoder was never set up.
+// which has nothing to overlap with: decoding fails only when the decoder was never set up, and for
+// want of memory.
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
@@ -34,7 +35,7 @@ int32_t set_up(vorbis_decoder *d, const wexa_frame *frame) {
     return av_decoder_open(&d->av, "vorbis", &setup) ? 0 : -1;
 }
 
-// Returns the sample frames that the last packet gave.
+// Returns the sample frames that the last packet gave; kAvNoMemory.
 int32_t decode_packets(vorbis_decoder *d, bundle_view *view) {
     if ((view->head.flags & kBundleFresh) != 0) {
         av_decoder_flush(&d->av);
@@ -44,6 +45,9 @@ int32_t decode_packets(vorbis_decoder *d, bundle_view *view) {
     for (const uint8_t *packet = bundle_next(view, &bytes); packet != nullptr;
          packet = bundle_next(view, &bytes)) {
         samples = av_decoder_decode(&d->av, packet, bytes);
+        if (samples == kAvNoMemory) {
+            return samples;
+        }
         if (samples < 0) {
             // What the decoder still holds is older than a seek to the next packet would find.
             av_decoder_flush(&d->av);
@@ -92,8 +96,12 @@ int32_t xvorbisd_decode(void *decoder, const wexa_frame *frame, wexa_output *out
         return -1;
     }
     const int32_t wanted = samples * channels * kSampleBytes;
+    const int32_t held = decode_packets(d, &view);
+    if (held == kAvNoMemory) {
+        return -1;
+    }
     int32_t got = 0;
-    if (decode_packets(d, &view) > 0) {
+    if (held > 0) {
         const av_channels policy = d->output_channels == 1   ? kAvMean
                                    : d->output_channels == 2 ? kAvFront
                                                              : kAvOwn;

@@ -149,7 +149,7 @@ void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t * /*word*/) {
     reader->block = head.channels * kSampleBytes;
     reader->data = head.data;
     reader->total = std::min(head.data_bytes / reader->block, kMaxSamples);
-    info->duration = units_from_samples(reader->total, reader->rate);
+    info->duration = units_of_duration(reader->total, reader->rate);
     return reader;
 }
 

@@ -66,7 +66,7 @@ bytes false_tag(size_t size) {
 class MpegSeams : public testing::TestWithParam<const char *> {};
 
 TEST_P(MpegSeams, AreExact) {
-    codec_test::expect_exact_seams(fixture(GetParam()), kFrame + 1);
+    codec_test::expect_exact_seams(fixture(GetParam()));
 }
 
 INSTANTIATE_TEST_SUITE_P(Files, MpegSeams,
@@ -170,7 +170,7 @@ TEST(MpegAudio, KeepsTheTimeOfDamagedFrames) {
                 std::all_of(silent, silent + 40 * kFrame, [](int16_t s) { return s == 0; }));
         }
         if (headers) {
-            codec_test::expect_exact_seams(path, kFrame + 1);
+            codec_test::expect_exact_seams(path);
         }
         // Behind noise that passes for frames, seams are exact again.
         codec_test::opened file_again(path);
@@ -205,13 +205,7 @@ TEST(MpegAudio, CountsWhatACutFileHolds) {
     for (size_t i = 12 * kFrame; i < rest.size(); ++i) {
         ASSERT_EQ(rest[i], plain[i + offset]) << i;
     }
-    codec_test::expect_exact_seams(save("tail.mp3", tail), kFrame + 1);
-}
-
-TEST(MpegAudio, SurvivesDamage) {
-    for (const char *name : {"vbr.mp3", "tagged.mp3", "low.mp3", "checked.mp3", "layer2.mp2"}) {
-        codec_test::expect_survives_damage(fixture(name), 10);
-    }
+    codec_test::expect_exact_seams(save("tail.mp3", tail));
 }
 
 struct direct {
@@ -337,7 +331,7 @@ TEST(MpegAudio, DecodesLayerOne) {
         // At 44.1 kHz the first frame is shorter than the delay and goes whole, nothing more.
         EXPECT_EQ(got.size(), (rate == 44100 ? 299U : 300U) * 384);
         EXPECT_TRUE(std::any_of(got.begin(), got.end(), [](int16_t s) { return s > 100; }));
-        codec_test::expect_exact_seams(path, 384 + 1);
+        codec_test::expect_exact_seams(path);
     }
 }
 

@@ -12,7 +12,8 @@ constexpr double kNoiseDecay = 0.008;  // seconds, the stick: a short burst over
 constexpr double kKickDecay = 0.06;    // seconds
 constexpr double kKickHz = 62.0;
 constexpr double kChordBeats = 16.0;
-constexpr double kFloor = 0.0008;  // noise floor of full scale: no digital silence, no ties
+constexpr double kOtherChannels = 0.8;  // of the first channel's bed
+constexpr double kFloor = 0.0008;       // noise floor of full scale: no digital silence, no ties
 // The loud section enters with an accent of the bed and then swells: a loudness curve of
 // overlapping windows has one steepest place near the entry instead of several equal ones.
 constexpr double kAccentSeconds = 0.3;
@@ -62,10 +63,11 @@ double faded_bed_gain_at(const song_spec &spec, double t) {
 
 // Saturated, so that it is as loud for its peaks as recorded music is.
 void add_bed(const song_spec &spec, int32_t channel, std::vector<double> &out) {
-    noise random = seeded(spec.seed, 100U + static_cast<uint32_t>(channel));
+    noise random = seeded(spec.seed, 100U);
     double phase = random.next() * kTwoPi;
     const double offset[2] = {random.next() * kTwoPi, random.next() * kTwoPi};
     noise floor = seeded(spec.seed, 200U + static_cast<uint32_t>(channel));
+    const double level = spec.bed_level * (channel == 0 ? 1.0 : kOtherChannels);
     const double chord_seconds = kChordBeats * 60.0 / spec.bpm;
     for (size_t i = 0; i < out.size(); ++i) {
         const double t = static_cast<double>(i) / spec.rate;
@@ -74,8 +76,7 @@ void add_bed(const song_spec &spec, int32_t channel, std::vector<double> &out) {
         phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / spec.rate;
         const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
                            std::sin(4.0 * phase + offset[1]);
-        out[i] +=
-            spec.bed_level * faded_bed_gain_at(spec, t) * std::tanh(sum) + kFloor * floor.next();
+        out[i] += level * faded_bed_gain_at(spec, t) * std::tanh(sum) + kFloor * floor.next();
     }
 }
 

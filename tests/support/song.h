@@ -14,7 +14,7 @@ namespace support {
 // audible hits.
 struct song_spec {
     int32_t rate = 44100;  // Hz
-    int32_t channels = 2;  // every channel has the drums, each a tonal bed of its own
+    int32_t channels = 2;  // the first is louder; each has a noise floor of its own
     double seconds = 60.0;
     double bpm = 120.0;
     uint32_t seed = 1;        // varies the hits' strengths (no two alike), the noise and the bed

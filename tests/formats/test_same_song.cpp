@@ -1,0 +1,106 @@
+// The same song gives the same result in every format, up to what its encoder changes.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstdlib>
+#include <map>
+#include <string>
+#include <vector>
+
+#include "tests/core/job_harness.h"
+
+namespace {
+
+constexpr int32_t kStep = 400;          // ms of the highlight's finest search
+constexpr double kNear = 25.0;          // ms between beats that are the same
+constexpr double kSame = 0.95;          // of the beats
+constexpr double kSamplesPerMs = 44.1;  // of all files
+constexpr int32_t kModes[] = {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH};
+
+struct analysis {
+    job::result result;
+    int32_t bpm = 0;
+};
+
+// Of a file in a mode, analysed once.
+const analysis &analysis_of(const std::string &name, int32_t mode) {
+    static std::map<std::pair<std::string, int32_t>, analysis> known;
+    const auto [place, is_new] = known.try_emplace({name, mode});
+    if (!is_new) return place->second;
+    int32_t err = 0;
+    TAVO_CTX *ctx = job::create(std::string(FORMAT_SONGS) + "/" + name, mode, &err);
+    EXPECT_NE(ctx, nullptr) << name << ": " << err;
+    if (ctx == nullptr) return place->second;
+    EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), TAVO_OK);
+    place->second.result = job::wait();
+    if (ctx->onset != nullptr) place->second.bpm = ctx->onset->bpm;
+    EXPECT_EQ(tavo_deinit(ctx), TAVO_OK);
+    return place->second;
+}
+
+// Share of beats that have one of others near, which come delay ms later.
+double share_near(const std::vector<float> &beats, const std::vector<float> &others, double delay) {
+    const auto is_near = [&](float beat) {
+        return std::any_of(others.begin(), others.end(), [&](float other) {
+            return std::fabs(static_cast<double>(other - beat) - delay) <= kNear;
+        });
+    };
+    const auto count = std::count_if(beats.begin(), beats.end(), is_near);
+    return static_cast<double>(count) / static_cast<double>(std::max<size_t>(beats.size(), 1));
+}
+
+struct encoded {
+    const char *name;
+    double delay;  // samples by which the encoder's output comes late
+};
+
+void PrintTo(const encoded &each, std::ostream *out) {
+    *out << each.name;
+}
+
+class SameSong : public testing::TestWithParam<encoded> {};
+
+TEST_P(SameSong, GivesTheSameResult) {
+    for (const int32_t mode : kModes) {
+        SCOPED_TRACE(mode);
+        const analysis &plain = analysis_of("song.wav", mode);
+        const analysis &got = analysis_of(GetParam().name, mode);
+        ASSERT_EQ(got.result.status, 0);
+        EXPECT_LE(std::abs(got.result.hl_pos - plain.result.hl_pos), kStep);
+        EXPECT_EQ(got.bpm, plain.bpm);
+        if (mode == TAVO_MODE_HIGHLIGHT) continue;
+        const double delay = GetParam().delay / kSamplesPerMs;
+        EXPECT_GE(share_near(plain.result.beats, got.result.beats, delay), kSame);
+        EXPECT_GE(share_near(got.result.beats, plain.result.beats, -delay), kSame);
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Formats, SameSong,
+                         testing::Values(encoded{"song.flac", 0}, encoded{"constant.mp3", 576},
+                                         encoded{"variable.mp3", 576},
+                                         encoded{"variable_bare.mp3", 576},
+                                         encoded{"song.aac", 1024}, encoded{"song.m4a", 1024},
+                                         encoded{"song.ogg", 0}),
+                         [](const testing::TestParamInfo<encoded> &each) {
+                             std::string name = each.param.name;
+                             std::replace(name.begin(), name.end(), '.', '_');
+                             return name;
+                         });
+
+// The song's highlight is a whole second, which a seek in the WAV file reaches as well.
+TEST(SameSong, IsTheSameToTheBitWithoutLoss) {
+    for (const int32_t mode : kModes) {
+        SCOPED_TRACE(mode);
+        const analysis &plain = analysis_of("song.wav", mode);
+        const analysis &got = analysis_of("song.flac", mode);
+        EXPECT_EQ(plain.result.status, 0);
+        EXPECT_EQ(plain.result.hl_pos, mode == TAVO_MODE_BEATS ? 0 : 31000);
+        EXPECT_EQ(plain.result.beats.size() > 80, mode != TAVO_MODE_HIGHLIGHT);
+        EXPECT_EQ(got.result.hl_pos, plain.result.hl_pos);
+        EXPECT_EQ(got.bpm, plain.bpm);
+        EXPECT_EQ(got.result.beats, plain.result.beats);
+    }
+}
+
+}  // namespace
