@@ -1,12 +1,14 @@
 #!/bin/sh
 # aarch64-sysroot.sh: lays out Debian's arm64 libraries in build/aarch64-sysroot, for the cross
-# compiler and for qemu. Nothing of this system changes: no foreign architecture, no package. Does
-# nothing when the sysroot is there already.
+# compiler and for qemu, and the two headers of Android's that the library includes. Nothing of this
+# system changes: no foreign architecture, no package. Does nothing when the sysroot is there.
 set -eu
 cd "$(dirname "$0")/.."
 root=$PWD/build/aarch64-sysroot
-packages='libc6-dev libstdc++-12-dev libavcodec-dev libavformat-dev libogg-dev libgtest-dev libbenchmark-dev'
-[ -e "$root/.complete" ] && [ "$(cat "$root/.complete")" = "$packages" ] && exit 0
+packages='libc6-dev libstdc++-12-dev libavcodec-dev libavformat-dev libogg-dev libgtest-dev
+    libbenchmark-dev'
+headers='android-libnativehelper-dev:amd64 android-liblog-dev:amd64' # built for amd64 alone
+[ -e "$root/.complete" ] && [ "$(cat "$root/.complete")" = "$packages $headers" ] && exit 0
 
 apt=$PWD/build/aarch64-apt
 rm -rf "$root" "$apt"
@@ -15,7 +17,7 @@ mkdir -p "$root/usr/lib" "$apt/lists/partial" "$apt/archives/partial"
 cat >"$apt/apt.conf" <<END
 #clear APT::Architectures;
 APT::Architecture "arm64";
-APT::Architectures { "arm64"; };
+APT::Architectures { "arm64"; "amd64"; };
 APT::Install-Recommends "false";
 APT::Sandbox::User "root";
 Acquire::Languages "none";
@@ -28,10 +30,12 @@ export APT_CONFIG="$apt/apt.conf"
 apt-get -qq update
 # shellcheck disable=SC2086 # the packages are words
 apt-get -qq -y --download-only install $packages >/dev/null
+# shellcheck disable=SC2086
+(cd "$apt/archives" && apt-get -qq download $headers)
 
 ln -s usr/lib "$root/lib"
 for package in "$apt"/archives/*.deb; do
     dpkg-deb --fsys-tarfile "$package" | tar -x --keep-directory-symlink -C "$root"
 done
 rm -rf "$apt"
-echo "$packages" >"$root/.complete"
+echo "$packages $headers" >"$root/.complete"

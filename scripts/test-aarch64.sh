@@ -32,4 +32,4 @@ ctest --preset release -R '^results_'
 
 cmake --preset aarch64
 cmake --build --preset aarch64
-ctest --preset aarch64
+ctest --preset aarch64 -j2
