@@ -1,81 +1,86 @@
-// Stage 1: an audio file becomes a stream of 16-bit mono PCM bytes, read in pieces of any size and
-// positioned by time.
-//
-// In: a path. Out: PCM at the stream's own rate, native byte order. After: pcm/decode.h.
-// A source is used by one thread at a time; different sources share nothing.
+/// @file
+/// Stage 1: an audio file becomes a stream of 16-bit mono PCM bytes, read in pieces of any size and
+/// positioned by time.
+///
+/// In: a path. Out: PCM at the stream's own rate, native byte order. After: pcm/decode.h.
+/// A source is used by one thread at a time; different sources share nothing.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_H
 #define TAVO_MEDIA_SOURCE_MTSRC_H
 
 #include "media_source/mtsrc_io.h"
 
-struct mtsrc_ctx;
+struct mtsrc_ctx;  // the handle
 
+/// What mtsrc_init reads.
 struct mtsrc_param {
-    const char *path;  // NUL-terminated, at most 511 bytes; copied
+    const char *path;  ///< NUL-terminated, at most 511 bytes; copied
 };
 
+/// The stream that a source delivers.
 struct mtsrc_format {
-    int32_t sample_rate;  // Hz
-    int32_t channels;     // of the decoder's output; the PCM delivered always has one
-    int32_t bits;         // 16
-    int64_t duration;     // 100-ns units
+    int32_t sample_rate;  ///< Hz
+    int32_t channels;     ///< of the decoder's output; the PCM delivered always has one
+    int32_t bits;         ///< 16
+    int64_t duration;     ///< 100-ns units
 };
 static_assert(offsetof(mtsrc_format, duration) == 16);
 
-// The caller's request: data has room for the bytes wanted, size receives the bytes delivered.
+/// The caller's request.
 struct mtsrc_frame {
-    void *data;
-    int32_t size;
+    void *data;    ///< room for the bytes wanted
+    int32_t size;  ///< receives the bytes delivered
 };
 
 // Type codes of recognition.
-constexpr int32_t kTypeMp4 = 2000;
-constexpr int32_t kTypeAsf = 2002;
-constexpr int32_t kTypeOgg = 2005;
-constexpr int32_t kTypeWav = 2006;
-constexpr int32_t kTypeAac = 2007;
-constexpr int32_t kTypeMpegLayer1 = 303;
-constexpr int32_t kTypeMpegLayer2 = 304;
-constexpr int32_t kTypeMpegLayer3 = 305;
-constexpr int32_t kTypeFlac = 322;
-constexpr int32_t kTypeUnknown = 2199;
+constexpr int32_t kTypeMp4 = 2000;        ///< MP4
+constexpr int32_t kTypeAsf = 2002;        ///< ASF, which no source reads
+constexpr int32_t kTypeOgg = 2005;        ///< Ogg
+constexpr int32_t kTypeWav = 2006;        ///< RIFF WAVE
+constexpr int32_t kTypeAac = 2007;        ///< AAC as ADTS or ADIF
+constexpr int32_t kTypeMpegLayer1 = 303;  ///< MPEG audio Layer I
+constexpr int32_t kTypeMpegLayer2 = 304;  ///< MPEG audio Layer II
+constexpr int32_t kTypeMpegLayer3 = 305;  ///< MPEG audio Layer III
+constexpr int32_t kTypeFlac = 322;        ///< FLAC
+constexpr int32_t kTypeUnknown = 2199;    ///< nothing fits
 
 extern "C" {
 
-// Opens the file. Returns a handle, the caller's until mtsrc_deinit, with *err 0; or null with *err
-// -2 out of memory, -3 unknown or refused format or path too long, -4 no path, -6 cannot be read
-// for recognition (shorter than 16 bytes), -7 cannot be opened or no usable audio, -255 the codec
-// library.
+/// Opens the file. Returns a handle, the caller's until mtsrc_deinit, with *err 0; or null with
+/// *err -2 out of memory, -3 unknown or refused format or path too long, -4 no path, -6 cannot be
+/// read for recognition (shorter than 16 bytes), -7 cannot be opened or no usable audio, -255 the
+/// codec library.
 mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err);
 
-// The same for a caller's own callback record, which is copied; on success the handle owns io->path
-// (malloc). flags: 0, not used. On failure the path stays the caller's.
+/// The same for a caller's own callback record, which is copied; on success the handle owns
+/// io->path (malloc). flags: 0, not used. On failure the path stays the caller's.
 mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t flags, int32_t *err);
 
-// Returns 0; -4 bad handle or null fmt.
+/// Returns 0; -4 bad handle or null fmt.
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt);
 
-// Moves to position (100-ns units); *reached gets the position where reading resumes, and is always
-// written on success. Returns 0; -4 bad handle or failed seek, after which the queue is empty.
+/// Moves to position (100-ns units); *reached gets the position where reading resumes, and is
+/// always written on success. Returns 0; -4 bad handle or failed seek, after which the queue is
+/// empty.
 int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached);
 
-// Delivers want bytes (at most 8192 by custom). Returns 0 exactly want bytes; 1 end of stream, the
-// bytes left; -2 out of memory; -4 bad handle or frame, want negative or more than the queue can
-// hold before the stream ends; -6 read or decode failure.
+/// Delivers want bytes (at most 8192 by custom). Returns 0 exactly want bytes; 1 end of stream, the
+/// bytes left; -2 out of memory; -4 bad handle or frame, want negative or more than the queue can
+/// hold before the stream ends; -6 read or decode failure.
 int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
 
-// Empties the queue and resets the decoder. Returns -5 (done); -4 bad handle.
+/// Empties the queue and resets the decoder. Returns -5 (done); -4 bad handle.
 int32_t mtsrc_reset(mtsrc_ctx *src);
 
-// Releases everything. Returns -5 (done); -4 bad handle.
+/// Releases everything. Returns -5 (done); -4 bad handle.
 int32_t mtsrc_deinit(mtsrc_ctx *src);
 
-// Recognises an open file by its content. Returns 0 with *type set (kTypeUnknown when nothing fits)
-// and the file offset where it was; -6 when 16 bytes cannot be read.
+/// Recognises an open file by its content. Returns 0 with *type set (kTypeUnknown when nothing
+/// fits) and the file offset where it was; -6 when 16 bytes cannot be read.
 int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type);
 
-// The probes, in the order in which they are asked. head: the first 16 bytes. Each returns a type
-// code.
+/// A probe; they stand in the order in which they are asked. head: the first 16 bytes. Returns a
+/// type code.
+/// @{
 int32_t mtsrc_probe_asf(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 int32_t mtsrc_probe_mp4(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 int32_t mtsrc_probe_flac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
@@ -83,6 +88,7 @@ int32_t mtsrc_probe_ogg(const uint8_t *head, const mtsrc_io *io, mtsrc_file *fil
 int32_t mtsrc_probe_wav(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 int32_t mtsrc_probe_aac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 int32_t mtsrc_probe_mpeg(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
+/// @}
 }
 
 #endif

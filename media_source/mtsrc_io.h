@@ -1,5 +1,7 @@
-// The file callbacks that a media source hands to the format probes and to the codec library, which
-// opens and reads the file through them. Another binary reads this record: its layout is fixed.
+/// @file
+/// The file callbacks that a media source hands to the format probes and to the codec library,
+/// which opens and reads the file through them. Another binary reads this record: its layout is
+/// fixed.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_IO_H
 #define TAVO_MEDIA_SOURCE_MTSRC_IO_H
 
@@ -8,35 +10,39 @@
 
 struct mtsrc_io;
 
-// A file as the callbacks see it: a heap cell made by open, freed by close.
+/// A file as the callbacks see it: a heap cell made by open, freed by close.
 struct mtsrc_file {
-    int32_t fd;  // -1: none
+    int32_t fd;  ///< -1: none
 };
 
+/// The callbacks and what they work on.
 struct mtsrc_io {
-    mtsrc_file *(*open)(const mtsrc_io *io, int32_t mode);        // bit 0 of mode: read-write
-    int32_t (*close)(mtsrc_file *file);                           // 0 or -1
-    int64_t (*read)(mtsrc_file *file, void *buf, int32_t count);  // bytes read, 0 end, -1
-    int64_t (*write)(mtsrc_file *file, const void *buf, int32_t count);  // bytes written, -1
-    int32_t (*tell)(mtsrc_file *file, int64_t *offset);                  // 0 or -1
-    int32_t (*seek)(mtsrc_file *file, const int64_t *offset);            // absolute; 0 or -1
-    int32_t (*skip)(mtsrc_file *file, const int64_t *distance);          // forward, >= 1; 0 or -1
-    int32_t (*size)(mtsrc_file *file, int64_t *length);                  // offset kept; 0 or -1
-    uint64_t reserved_64;
-    int32_t fd;  // descriptor to duplicate when path is "fd"
-    int32_t reserved_76;
-    uint64_t reserved_80;
-    char *path;  // the source's own copy, a 512-byte buffer
-    uint64_t reserved_96[3];
+    mtsrc_file *(*open)(const mtsrc_io *io, int32_t mode);        ///< bit 0 of mode: read-write
+    int32_t (*close)(mtsrc_file *file);                           ///< 0 or -1
+    int64_t (*read)(mtsrc_file *file, void *buf, int32_t count);  ///< bytes read, 0 end, -1
+    int64_t (*write)(mtsrc_file *file, const void *buf, int32_t count);  ///< bytes written, -1
+    int32_t (*tell)(mtsrc_file *file, int64_t *offset);                  ///< 0 or -1
+    int32_t (*seek)(mtsrc_file *file, const int64_t *offset);            ///< absolute; 0 or -1
+    int32_t (*skip)(mtsrc_file *file, const int64_t *distance);          ///< forward, >= 1; 0 or -1
+    int32_t (*size)(mtsrc_file *file, int64_t *length);                  ///< offset kept; 0 or -1
+    uint64_t reserved_64;                                                ///< 0
+    int32_t fd;               ///< descriptor to duplicate when path is "fd"
+    int32_t reserved_76;      ///< 0
+    uint64_t reserved_80;     ///< 0
+    char *path;               ///< the source's own copy, a 512-byte buffer
+    uint64_t reserved_96[3];  ///< 0
 };
 static_assert(offsetof(mtsrc_io, size) == 56 && offsetof(mtsrc_io, fd) == 72);
 static_assert(offsetof(mtsrc_io, path) == 88 && sizeof(mtsrc_io) == 120);
 
 extern "C" {
 
-// Opens io->path (or duplicates io->fd when the path is "fd") at offset 0. Returns a new handle,
-// null on failure. mode bit 0: 0 read-only, 1 read-write, created with permissions 0644.
+/// Opens io->path (or duplicates io->fd when the path is "fd") at offset 0. Returns a new handle,
+/// null on failure. mode bit 0: 0 read-only, 1 read-write, created with permissions 0644.
 mtsrc_file *mtsrc_file_open(const mtsrc_io *io, int32_t mode);
+
+/// A callback on a file of mtsrc_file_open, as the field of the same name in mtsrc_io.
+/// @{
 int32_t mtsrc_file_close(mtsrc_file *file);
 int64_t mtsrc_file_read(mtsrc_file *file, void *buf, int32_t count);
 int64_t mtsrc_file_write(mtsrc_file *file, const void *buf, int32_t count);
@@ -44,6 +50,7 @@ int32_t mtsrc_file_tell(mtsrc_file *file, int64_t *offset);
 int32_t mtsrc_file_seek(mtsrc_file *file, const int64_t *offset);
 int32_t mtsrc_file_skip(mtsrc_file *file, const int64_t *distance);
 int32_t mtsrc_file_size(mtsrc_file *file, int64_t *length);
+/// @}
 }
 
 #endif

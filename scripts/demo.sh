@@ -31,17 +31,23 @@ if [[ -z $file ]]; then
   "$bin/make_song" "$file" --seconds 90 --bpm 120 --loud-at 30
 fi
 
-echo
-echo "\$ $bin/tavo --length 30 $file"
+show() {
+  echo
+  printf '$'
+  printf ' %q' "$bin/tavo" "$@"
+  echo
+  "$bin/tavo" "$@"
+}
 status=0
-"$bin/tavo" --length 30 -- "$file" || status=$?
-echo
+{ show --mode highlight -- "$file" && show -- "$file"; } || status=$?
 if [[ $status -eq 0 ]]; then
   cat <<'END'
+
 stream     what the file holds: its length, sample rate and channels
-highlight  where the song's strongest loud passage starts, and 30 s from there (--length)
-tempo      beats a minute
-beats      how many were found from the highlight on, the first and the last of them;
+highlight  where the song's strongest loud passage starts. The second run looks for beats from there
+           on: it starts where a seek to the highlight lands, in WAV at a whole second
+tempo      beats a minute, to the nearest step of the analysis (117, 123, ...)
+beats      good places for a cut, at least about a second apart: how many, the first and the last;
            --format json, csv or labels lists them all
 END
 fi

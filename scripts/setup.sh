@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
-# scripts/setup.sh [build|tests]...
-# Installs the Debian packages that are missing, all groups by default. Says nothing when none is.
+# scripts/setup.sh [build|tests|package]...
+# Installs the Debian packages that are missing, for building and testing by default. Says nothing
+# when none is.
 set -euo pipefail
 
 build=(
@@ -13,7 +14,9 @@ tests=(
   libgtest-dev libbenchmark-dev
   python3 clang-format
   ffmpeg flac lame vorbis-tools
+  doxygen groff-base
 )
+package=(dpkg-dev file debootstrap) # scripts/test-package.sh
 
 wanted=()
 for group in "${@:-build tests}"; do
@@ -21,7 +24,8 @@ for group in "${@:-build tests}"; do
     case $name in
       build) wanted+=("${build[@]}") ;;
       tests) wanted+=("${tests[@]}") ;;
-      *) echo "setup: no group '$name'; groups: build, tests" >&2; exit 2 ;;
+      package) wanted+=("${package[@]}") ;;
+      *) echo "setup: no group '$name'; groups: build, tests, package" >&2; exit 2 ;;
     esac
   done
 done
@@ -32,9 +36,9 @@ if ! command -v dpkg-query >/dev/null; then
 fi
 
 missing=()
-for package in "${wanted[@]}"; do
-  state=$(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null || true)
-  [[ $state == *installed* && $state != *not-installed* ]] || missing+=("$package")
+for name in "${wanted[@]}"; do
+  state=$(dpkg-query -W -f '${db:Status-Status}' "$name" 2>/dev/null || true)
+  [[ $state == *installed* && $state != *not-installed* ]] || missing+=("$name")
 done
 [[ ${#missing[@]} -eq 0 ]] && exit 0
 

@@ -20,7 +20,7 @@ for preset in release asan tsan; do
 done
 for preset in release asan tsan; do
   echo "== $preset: tests"
-  ctest --preset "$preset" || failed+=("$preset")
+  ctest --preset "$preset" --parallel "$(nproc)" || failed+=("$preset")
 done
 if [[ ${#failed[@]} -gt 0 ]]; then
   echo "tests failed in: ${failed[*]}" >&2

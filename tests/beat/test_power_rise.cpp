@@ -50,6 +50,13 @@ TEST(PowerRise, FirstSampleThatReachesTheTarget) {
     EXPECT_EQ(rises_of(steps({{10 * kBlock + 2000, 0.5}})), samples{10 * kBlock + 1998});
 }
 
+// Anything below level 1000 counts as -30.31 dB. A step to -28.03 dB (level 1300) is then too low,
+// its limit being -32.03; one to -24.29 dB (2000) is not, and its target lies below the floor.
+TEST(PowerRise, SilenceCountsAsTheFloor) {
+    EXPECT_EQ(rises_of(steps({{10 * kBlock + 2000, sample_of_level(1300)}})), samples{});
+    EXPECT_EQ(rises_of(steps({{10 * kBlock + 2000, sample_of_level(2000)}})), samples{10 * kBlock});
+}
+
 // -23.46 dB before the step is below the limit of -17.75 but above the target of -24.08.
 TEST(PowerRise, BoundarySampleCarriesTheBlockBefore) {
     const double quiet = sample_of_level(2200);

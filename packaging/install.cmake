@@ -1,0 +1,38 @@
+# cmake --install. The public headers go to include/tavo, which both packages name as the include
+# folder: <tavo.h>, <media_source/mtsrc.h>. Whatever is installed finds the rest relative to itself.
+set(headers_dir ${CMAKE_INSTALL_INCLUDEDIR}/tavo)
+set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/tavo)
+install(FILES core/tavo.h DESTINATION ${headers_dir})
+install(FILES media_source/mtsrc.h media_source/mtsrc_io.h DESTINATION ${headers_dir}/media_source)
+install(TARGETS tavo EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}
+  INCLUDES DESTINATION ${headers_dir})
+
+# A device brings these two. Here they are the library's own: their names are too common for a folder
+# that every program searches, and android-liblog has a liblog of another make.
+if(NOT ANDROID)
+  install(TARGETS log wexaaudio EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)
+endif()
+
+include(CMakePackageConfigHelpers)
+write_basic_package_version_file(${CMAKE_BINARY_DIR}/packaging/tavoConfigVersion.cmake
+  COMPATIBILITY SameMajorVersion)
+install(EXPORT tavo NAMESPACE tavo:: FILE tavoTargets.cmake DESTINATION ${package_dir})
+install(FILES packaging/tavoConfig.cmake ${CMAKE_BINARY_DIR}/packaging/tavoConfigVersion.cmake
+  DESTINATION ${package_dir})
+
+file(RELATIVE_PATH pc_to_prefix /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
+string(REGEX REPLACE "/$" "" pc_to_prefix ${pc_to_prefix})
+configure_file(packaging/tavo.pc.in packaging/tavo.pc @ONLY)
+install(FILES ${CMAKE_BINARY_DIR}/packaging/tavo.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+
+if(TARGET tavo_command)
+  install(TARGETS tavo_command DESTINATION ${CMAKE_INSTALL_BINDIR})
+  install(FILES packaging/tavo.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
+  install(FILES packaging/tavo.bash RENAME tavo
+    DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
+endif()
+
+install(FILES README.md CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
+install(DIRECTORY docs/ DESTINATION ${CMAKE_INSTALL_DOCDIR}/docs
+  FILES_MATCHING REGEX "\\.(md|svg|png)$" PATTERN api.md EXCLUDE)
+install(DIRECTORY examples DESTINATION ${CMAKE_INSTALL_DOCDIR})

@@ -1,0 +1,35 @@
+# Completion of the command tavo for bash.
+_tavo() {
+    local word=${COMP_WORDS[COMP_CWORD]} before=${COMP_WORDS[COMP_CWORD - 1]} i
+    COMPREPLY=()
+    for ((i = 1; i < COMP_CWORD; i++)); do
+        if [[ ${COMP_WORDS[i]} == -- ]]; then
+            mapfile -t COMPREPLY < <(compgen -f -- "$word")
+            return
+        fi
+    done
+    # --name=value reaches us as three words.
+    if [[ $word == '=' ]]; then
+        word=
+    elif [[ $before == '=' ]]; then
+        before=${COMP_WORDS[COMP_CWORD - 2]}
+    fi
+    case $before in
+        -m | --mode) mapfile -t COMPREPLY < <(compgen -W 'highlight beats both' -- "$word") ;;
+        -f | --format) mapfile -t COMPREPLY < <(compgen -W 'text json csv labels' -- "$word") ;;
+        -o | --output-dir) mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
+        -l | --length | -j | --jobs | --max-beats) ;; # a number
+        --click | --plot | --files-from) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
+        *)
+            if [[ $word == -* ]]; then
+                mapfile -t COMPREPLY < <(compgen -W '-h --help --version
+                    -m --mode -l --length --max-beats -j --jobs
+                    -f --format -o --output-dir --force --click --plot -q --quiet
+                    -r --recursive --files-from -0 --null' -- "$word")
+            else
+                mapfile -t COMPREPLY < <(compgen -f -- "$word")
+            fi
+            ;;
+    esac
+}
+complete -o filenames -F _tavo tavo
