@@ -90,7 +90,7 @@ struct reading {
     int64_t samples = 0;
 };
 
-outcome read_sound(mtsrc_ctx *source, int32_t rate, int stop_fd, reading &to) {
+outcome read_source(mtsrc_ctx *source, int32_t rate, int stop_fd, reading &to) {
     to.loudness.window.resize(static_cast<size_t>(kWindowSeconds * rate));
     to.loudness.hop = static_cast<size_t>(kHopSeconds * rate);
     std::array<int16_t, kBlockSamples> block{};
@@ -106,6 +106,14 @@ outcome read_sound(mtsrc_ctx *source, int32_t rate, int stop_fd, reading &to) {
     }
     if (to.waveform.open_samples > 0) to.waveform.full.push_back(to.waveform.open);
     return outcome::ok;
+}
+
+outcome read_sound(const std::string &path, int32_t rate, int stop_fd, reading &to) {
+    const mtsrc_param param{path.c_str()};
+    int32_t code = 0;
+    const std::unique_ptr<mtsrc_ctx, decltype(&mtsrc_deinit)> source(mtsrc_init(&param, &code),
+                                                                     mtsrc_deinit);
+    return source == nullptr ? outcome::failed : read_source(source.get(), rate, stop_fd, to);
 }
 
 // Each column takes every bin that it touches.
@@ -145,22 +153,18 @@ void fill_plot(const record &what, const reading &from, int32_t rate, plot_data 
 }  // namespace
 
 outcome gather_plot(const record &what, int stop_fd, plot_data &out, std::string &error) {
-    library_path opened = open_library_path(what.file);
-    const mtsrc_param param{opened.path.c_str()};
-    int32_t code = 0;
-    const std::unique_ptr<mtsrc_ctx, decltype(&mtsrc_deinit)> source(mtsrc_init(&param, &code),
-                                                                     mtsrc_deinit);
-    close_library_path(opened);
     reading from;
-    outcome end = outcome::failed;
-    if (source != nullptr) end = read_sound(source.get(), what.sample_rate, stop_fd, from);
+    library_path opened = open_library_path(what.file);
+    const outcome end = read_sound(opened.path, what.sample_rate, stop_fd, from);
+    close_library_path(opened);
     if (end == outcome::stopped) {
         error = "The analysis was stopped.";
-    } else if (from.samples == 0) {
-        error = "The sound could not be read again for the picture.";
-        end = outcome::failed;
-    } else {
-        fill_plot(what, from, what.sample_rate, out);
+        return end;
     }
-    return end;
+    if (from.samples == 0) {
+        error = "The sound could not be read again for the picture.";
+        return outcome::failed;
+    }
+    fill_plot(what, from, what.sample_rate, out);
+    return outcome::ok;
 }
