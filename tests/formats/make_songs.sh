@@ -10,14 +10,25 @@ fi
 rm -rf "$out"
 mkdir -p "$out"
 cd "$out"
+convert() { # convert IN OUT OPTIONS...
+  in=$1 to=$2
+  shift 2
+  ffmpeg -nostdin -v error -y -i "$in" -fflags +bitexact -flags:a +bitexact "$@" "$to"
+}
 
-# A quarter of it is whole seconds, and so is its highlight: what the WAV source can reach.
-"$make_song" song.wav --seconds 80 --bpm 118 --loud-at 31 --seed 5 >/dev/null
+"$make_song" song.wav
 flac --totally-silent -5 -o song.flac song.wav
 lame --quiet -b 160 -t song.wav constant.mp3
 lame --quiet -V 2 song.wav variable.mp3
 lame --quiet -V 2 -t song.wav variable_bare.mp3 # without the encoder's table
-ffmpeg -nostdin -v error -y -i song.wav -fflags +bitexact -flags:a +bitexact -c:a aac -b:a 160k song.aac
-ffmpeg -nostdin -v error -y -i song.aac -fflags +bitexact -c:a copy -bsf:a aac_adtstoasc song.m4a
+convert song.wav song.aac -c:a aac -b:a 160k
+convert song.aac song.m4a -c:a copy -bsf:a aac_adtstoasc
 oggenc --quiet -q 6 -s 1 -o song.ogg song.wav
+
+# The song as late as the encoders make it.
+for samples in 576 1024; do
+  convert song.wav late.wav -af "adelay=${samples}S:all=1"
+  flac --totally-silent -5 -o "late_$samples.flac" late.wav
+  rm late.wav
+done
 touch .complete

@@ -1,4 +1,8 @@
 // The same song gives the same result in every format, up to what its encoder changes.
+//
+// An encoder's delay moves the song between the frames of the analysis, which moves beats by a
+// frame of 23 ms either way, with nothing lost. So an encoded song is compared with one that comes
+// as late.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -12,10 +16,9 @@
 
 namespace {
 
-constexpr int32_t kStep = 400;          // ms of the highlight's finest search
-constexpr double kNear = 25.0;          // ms between beats that are the same
-constexpr double kSame = 0.95;          // of the beats
-constexpr double kSamplesPerMs = 44.1;  // of all files
+constexpr int32_t kStep = 400;  // ms of the highlight's finest search
+constexpr float kNear = 25.0F;  // ms between beats that are the same
+constexpr double kSame = 0.95;  // of the beats
 constexpr int32_t kModes[] = {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH};
 
 struct analysis {
@@ -39,12 +42,11 @@ const analysis &analysis_of(const std::string &name, int32_t mode) {
     return place->second;
 }
 
-// Share of beats that have one of others near, which come delay ms later.
-double share_near(const std::vector<float> &beats, const std::vector<float> &others, double delay) {
+// Share of beats that have one of others near.
+double share_near(const std::vector<float> &beats, const std::vector<float> &others) {
     const auto is_near = [&](float beat) {
-        return std::any_of(others.begin(), others.end(), [&](float other) {
-            return std::fabs(static_cast<double>(other - beat) - delay) <= kNear;
-        });
+        return std::any_of(others.begin(), others.end(),
+                           [&](float other) { return std::fabs(other - beat) <= kNear; });
     };
     const auto count = std::count_if(beats.begin(), beats.end(), is_near);
     return static_cast<double>(count) / static_cast<double>(std::max<size_t>(beats.size(), 1));
@@ -52,7 +54,7 @@ double share_near(const std::vector<float> &beats, const std::vector<float> &oth
 
 struct encoded {
     const char *name;
-    double delay;  // samples by which the encoder's output comes late
+    const char *late;  // the song without loss, as late as the encoder makes it
 };
 
 void PrintTo(const encoded &each, std::ostream *out) {
@@ -65,23 +67,24 @@ TEST_P(SameSong, GivesTheSameResult) {
     for (const int32_t mode : kModes) {
         SCOPED_TRACE(mode);
         const analysis &plain = analysis_of("song.wav", mode);
+        const analysis &late = analysis_of(GetParam().late, mode);
         const analysis &got = analysis_of(GetParam().name, mode);
         ASSERT_EQ(got.result.status, 0);
         EXPECT_LE(std::abs(got.result.hl_pos - plain.result.hl_pos), kStep);
         EXPECT_EQ(got.bpm, plain.bpm);
         if (mode == TAVO_MODE_HIGHLIGHT) continue;
-        const double delay = GetParam().delay / kSamplesPerMs;
-        EXPECT_GE(share_near(plain.result.beats, got.result.beats, delay), kSame);
-        EXPECT_GE(share_near(got.result.beats, plain.result.beats, -delay), kSame);
+        EXPECT_GE(share_near(late.result.beats, got.result.beats), kSame);
+        EXPECT_GE(share_near(got.result.beats, late.result.beats), kSame);
     }
 }
 
 INSTANTIATE_TEST_SUITE_P(Formats, SameSong,
-                         testing::Values(encoded{"song.flac", 0}, encoded{"constant.mp3", 576},
-                                         encoded{"variable.mp3", 576},
-                                         encoded{"variable_bare.mp3", 576},
-                                         encoded{"song.aac", 1024}, encoded{"song.m4a", 1024},
-                                         encoded{"song.ogg", 0}),
+                         testing::Values(encoded{"constant.mp3", "late_576.flac"},
+                                         encoded{"variable.mp3", "late_576.flac"},
+                                         encoded{"variable_bare.mp3", "late_576.flac"},
+                                         encoded{"song.aac", "late_1024.flac"},
+                                         encoded{"song.m4a", "late_1024.flac"},
+                                         encoded{"song.ogg", "song.flac"}),
                          [](const testing::TestParamInfo<encoded> &each) {
                              std::string name = each.param.name;
                              std::replace(name.begin(), name.end(), '.', '_');
@@ -96,7 +99,7 @@ TEST(SameSong, IsTheSameToTheBitWithoutLoss) {
         const analysis &got = analysis_of("song.flac", mode);
         EXPECT_EQ(plain.result.status, 0);
         EXPECT_EQ(plain.result.hl_pos, mode == TAVO_MODE_BEATS ? 0 : 31000);
-        EXPECT_EQ(plain.result.beats.size() > 80, mode != TAVO_MODE_HIGHLIGHT);
+        EXPECT_EQ(plain.result.beats.size() > 20, mode != TAVO_MODE_HIGHLIGHT);
         EXPECT_EQ(got.result.hl_pos, plain.result.hl_pos);
         EXPECT_EQ(got.bpm, plain.bpm);
         EXPECT_EQ(got.result.beats, plain.result.beats);
