@@ -42,7 +42,7 @@ TEST_P(Damage, IsSurvived) {
         EXPECT_LT(between - start, kLongest);
         EXPECT_LT(std::chrono::steady_clock::now() - between, kLongest);
     }
-    EXPECT_GT(opened, kFiles / 3);
+    EXPECT_GT(opened, kFiles / 5);  // the others lost what says where the audio is
 }
 
 INSTANTIATE_TEST_SUITE_P(
