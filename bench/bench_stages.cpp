@@ -26,22 +26,22 @@ constexpr int32_t kTempoTransform = 4096;
 constexpr int32_t kTempoLags = 86;
 
 std::vector<int16_t> left_channel(int32_t rate) {
-    support::song_spec spec;
-    spec.seconds = 180.0;
-    spec.rate = rate;
-    spec.loud_at = 60.0;
-    spec.tail_at = 150.0;
-    return support::channel_of(support::make_song(spec), 0);
+    support::song_spec plan;
+    plan.seconds = 180.0;
+    plan.rate = rate;
+    plan.loud_at = 60.0;
+    plan.tail_at = 150.0;
+    return support::channel_of(support::make_song(plan), 0);
 }
 
 const std::string &song_file() {
     static const std::string path = [] {
-        support::song_spec spec;
-        spec.seconds = 180.0;
-        spec.loud_at = 60.0;
-        spec.tail_at = 150.0;
+        support::song_spec plan;
+        plan.seconds = 180.0;
+        plan.loud_at = 60.0;
+        plan.tail_at = 150.0;
         const std::string name = std::filesystem::temp_directory_path() / "tavo_bench.wav";
-        if (!support::write_wav(name, support::make_song(spec))) std::abort();
+        if (!support::write_wav(name, support::make_song(plan))) std::abort();
         return name;
     }();
     return path;

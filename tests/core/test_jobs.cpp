@@ -19,11 +19,11 @@ std::string write_song(const char *name, const support::song &song) {
 }
 
 support::song minute_song() {
-    support::song_spec spec;
-    spec.seconds = 100.0;
-    spec.loud_at = 41.0;
-    spec.tail_at = 80.0;
-    return support::make_song(spec);
+    support::song_spec plan;
+    plan.seconds = 100.0;
+    plan.loud_at = 41.0;
+    plan.tail_at = 80.0;
+    return support::make_song(plan);
 }
 
 job::result run(const std::string &path, int32_t mode, int32_t length = 0, int32_t max_beats = 0) {
@@ -86,7 +86,7 @@ TEST(Jobs, BothIsBeatsOfTheRestOfTheFile) {
 
     support::song rest = song;
     const auto cut =
-        static_cast<std::ptrdiff_t>(both.hl_pos) * song.spec.rate / 1000 * song.spec.channels;
+        static_cast<std::ptrdiff_t>(both.hl_pos) * song.plan.rate / 1000 * song.plan.channels;
     rest.pcm.erase(rest.pcm.begin(), rest.pcm.begin() + cut);
     const job::result beats = run(write_song("tavo_jobs_rest.wav", rest), TAVO_MODE_BEATS);
     ASSERT_EQ(beats.beat_count, both.beat_count);
@@ -124,12 +124,12 @@ TEST(Jobs, NothingDecodedIsReportedByMode) {
 // The beat analysis alone, on an analysis signal put into the instance: returns to its caller, and
 // in mode 2 shifts the beats by the highlight start.
 TEST(Jobs, BeatAnalysisAloneShiftsInMode2) {
-    support::song_spec spec;
-    spec.rate = 11025;
-    spec.channels = 1;
-    spec.seconds = 20.0;
-    spec.loud_at = 0.0;
-    const support::song song = support::make_song(spec);
+    support::song_spec plan;
+    plan.rate = 11025;
+    plan.channels = 1;
+    plan.seconds = 20.0;
+    plan.loud_at = 0.0;
+    const support::song song = support::make_song(plan);
     const std::string path = write_song("tavo_jobs_alone.wav", song);
 
     std::vector<float> beats[2];

@@ -17,25 +17,25 @@ constexpr int32_t kModes[] = {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BO
 // One song for all cases: 24 s at 120 BPM, loud from 8 s on.
 const std::string &song_path() {
     static const std::string path = [] {
-        support::song_spec spec;
-        spec.seconds = 24.0;
-        spec.rate = 22050;
-        spec.loud_at = 8.0;
-        spec.tail_at = 22.0;
+        support::song_spec plan;
+        plan.seconds = 24.0;
+        plan.rate = 22050;
+        plan.loud_at = 8.0;
+        plan.tail_at = 22.0;
         const std::string name = testing::TempDir() + "tavo_lifecycle.wav";
-        EXPECT_TRUE(support::write_wav(name, support::make_song(spec)));
+        EXPECT_TRUE(support::write_wav(name, support::make_song(plan)));
         return name;
     }();
     return path;
 }
 
 std::string wav_of_samples(const char *name, int32_t rate, size_t samples) {
-    support::wav_spec spec;
-    spec.rate = rate;
-    spec.channels = 1;
+    support::wav_spec plan;
+    plan.rate = rate;
+    plan.channels = 1;
     const std::string path = testing::TempDir() + name;
     EXPECT_TRUE(support::write_bytes(
-        path, support::wav_bytes(std::vector<int16_t>(samples, int16_t{100}), spec)));
+        path, support::wav_bytes(std::vector<int16_t>(samples, int16_t{100}), plan)));
     return path;
 }
 

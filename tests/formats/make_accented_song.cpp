@@ -10,20 +10,20 @@
 
 int main(int argc, char **argv) {
     if (argc != 2) return 2;
-    support::song_spec spec;
-    spec.seconds = 80.0;  // a quarter of it and its highlight are whole seconds: a WAV file's seeks
-    spec.loud_at = 31.0;
-    spec.tail_at = 66.0;
-    spec.seed = 2;
-    spec.drum_level = 0.08;
-    spec.bed_level = 0.37;
-    support::song song = support::make_song(spec);
+    support::song_spec plan;
+    plan.seconds = 80.0;  // a quarter of it and its highlight are whole seconds: a WAV file's seeks
+    plan.loud_at = 31.0;
+    plan.tail_at = 66.0;
+    plan.seed = 2;
+    plan.drum_level = 0.08;
+    plan.bed_level = 0.37;
+    support::song song = support::make_song(plan);
 
-    spec.bpm /= 4.0;
-    spec.seed = 9;
-    spec.drum_level = 0.6;
-    spec.bed_level = 0.0;
-    const support::song accents = support::make_song(spec);
+    plan.bpm /= 4.0;
+    plan.seed = 9;
+    plan.drum_level = 0.6;
+    plan.bed_level = 0.0;
+    const support::song accents = support::make_song(plan);
     for (size_t i = 0; i < song.pcm.size(); ++i) {
         song.pcm[i] = static_cast<int16_t>(std::clamp(song.pcm[i] + accents.pcm[i], -32768, 32767));
     }

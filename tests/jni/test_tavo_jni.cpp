@@ -69,12 +69,12 @@ void call_back_on_a_thread(TAVO_INFO info) {
 // A song in a file of its own for as long as the tests run.
 const std::string &song_path() {
     static const std::string path = [] {
-        support::song_spec spec;
-        spec.seconds = 20.0;
-        spec.loud_at = 6.0;
-        spec.tail_at = 16.0;
+        support::song_spec plan;
+        plan.seconds = 20.0;
+        plan.loud_at = 6.0;
+        plan.tail_at = 16.0;
         std::string made = testing::TempDir() + "tavo_jni_" + std::to_string(getpid()) + ".wav";
-        if (!support::write_wav(made, support::make_song(spec))) made.clear();
+        if (!support::write_wav(made, support::make_song(plan))) made.clear();
         return made;
     }();
     return path;

@@ -107,15 +107,15 @@ bytes data_chunk(const std::vector<int16_t> &pcm) {
 TEST(WavReader, ReadsEveryShapeOfHeader) {
     struct shape {
         const char *name;
-        support::wav_spec spec;
+        support::wav_spec plan;
         size_t frames;  // expected
     };
     support::wav_spec base;
     std::vector<shape> shapes;
     const auto add = [&](const char *name, size_t frames, auto change) {
-        support::wav_spec spec = base;
-        change(spec);
-        shapes.push_back({name, spec, frames});
+        support::wav_spec plan = base;
+        change(plan);
+        shapes.push_back({name, plan, frames});
     };
     using support::wav_data_size;
     add("plain", 30000, [](support::wav_spec &) {});
@@ -130,14 +130,14 @@ TEST(WavReader, ReadsEveryShapeOfHeader) {
     const std::vector<int16_t> pcm = numbers(60000);
     for (const shape &each : shapes) {
         SCOPED_TRACE(each.name);
-        reader file(codec_test::save("shape.wav", support::wav_bytes(pcm, each.spec)));
+        reader file(codec_test::save("shape.wav", support::wav_bytes(pcm, each.plan)));
         ASSERT_NE(file.handle, nullptr);
         EXPECT_EQ(file.info.codec, kWexaPcm);
         EXPECT_EQ(file.info.bits, 16);
         EXPECT_EQ(file.info.sample_rate, 44100);
-        ASSERT_EQ(file.info.channels, each.spec.channels);
+        ASSERT_EQ(file.info.channels, each.plan.channels);
         EXPECT_EQ(file.info.duration * 44100 / kUnits, static_cast<int64_t>(each.frames));
-        const auto count = static_cast<ptrdiff_t>(each.frames) * each.spec.channels;
+        const auto count = static_cast<ptrdiff_t>(each.frames) * each.plan.channels;
         EXPECT_EQ(rest(file), std::vector<int16_t>(pcm.begin(), pcm.begin() + count));
     }
 }
@@ -189,9 +189,9 @@ TEST(WavReader, RefusesWhatTheSourceCannotUse) {
 
 TEST(WavReader, SeeksToWholeSecondsAndReportsTimes) {
     const std::vector<int16_t> pcm = numbers(2 * 22051);  // one sample frame beyond 2 s at 11025 Hz
-    support::wav_spec spec;
-    spec.rate = 11025;
-    reader file(codec_test::save("seek.wav", support::wav_bytes(pcm, spec)));
+    support::wav_spec plan;
+    plan.rate = 11025;
+    reader file(codec_test::save("seek.wav", support::wav_bytes(pcm, plan)));
     ASSERT_NE(file.handle, nullptr);
     struct landing {
         int64_t seconds;

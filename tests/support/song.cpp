@@ -42,52 +42,52 @@ noise seeded(uint32_t seed, uint32_t use) {
     return made;
 }
 
-double gain_at(const song_spec &spec, double t) {
-    if (t < spec.loud_at || t >= spec.tail_at) return spec.quiet_gain;
-    const double to_go = spec.loud_at > 0.0 ? 1.0 - (t - spec.loud_at) / kSwellSeconds : 0.0;
-    return spec.loud_gain * (1.0 - kSwell * std::fmax(to_go, 0.0));
+double gain_at(const song_spec &plan, double t) {
+    if (t < plan.loud_at || t >= plan.tail_at) return plan.quiet_gain;
+    const double to_go = plan.loud_at > 0.0 ? 1.0 - (t - plan.loud_at) / kSwellSeconds : 0.0;
+    return plan.loud_gain * (1.0 - kSwell * std::fmax(to_go, 0.0));
 }
 
-double bed_gain_at(const song_spec &spec, double t) {
+double bed_gain_at(const song_spec &plan, double t) {
     const bool accent =
-        spec.loud_at > 0.0 && t >= spec.loud_at && t < spec.loud_at + kAccentSeconds;
-    return gain_at(spec, t) * (accent ? kAccent : 1.0);
+        plan.loud_at > 0.0 && t >= plan.loud_at && t < plan.loud_at + kAccentSeconds;
+    return gain_at(plan, t) * (accent ? kAccent : 1.0);
 }
 
 // As bed_gain_at, without a step: the bed reaches the new gain kFadeSeconds after the change.
-double faded_bed_gain_at(const song_spec &spec, double t) {
+double faded_bed_gain_at(const song_spec &plan, double t) {
     double sum = 0.0;
-    for (int k = 0; k < 4; ++k) sum += bed_gain_at(spec, t - kFadeSeconds * k / 4.0);
+    for (int k = 0; k < 4; ++k) sum += bed_gain_at(plan, t - kFadeSeconds * k / 4.0);
     return sum / 4.0;
 }
 
 // Saturated, so that it is as loud for its peaks as recorded music is.
-void add_bed(const song_spec &spec, int32_t channel, std::vector<double> &out) {
-    noise random = seeded(spec.seed, 100U);
+void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
+    noise random = seeded(plan.seed, 100U);
     double phase = random.next() * kTwoPi;
     const double offset[2] = {random.next() * kTwoPi, random.next() * kTwoPi};
-    noise floor = seeded(spec.seed, 200U + static_cast<uint32_t>(channel));
-    const double level = spec.bed_level * (channel == 0 ? 1.0 : kOtherChannels);
-    const double chord_seconds = kChordBeats * 60.0 / spec.bpm;
+    noise floor = seeded(plan.seed, 200U + static_cast<uint32_t>(channel));
+    const double level = plan.bed_level * (channel == 0 ? 1.0 : kOtherChannels);
+    const double chord_seconds = kChordBeats * 60.0 / plan.bpm;
     for (size_t i = 0; i < out.size(); ++i) {
-        const double t = static_cast<double>(i) / spec.rate;
+        const double t = static_cast<double>(i) / plan.rate;
         // Chords change on the grid of the hits; one whole cycle ahead keeps the index positive.
-        const double chord = (t - spec.first_hit) / chord_seconds + 4.0;
-        phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / spec.rate;
+        const double chord = (t - plan.first_hit) / chord_seconds + 4.0;
+        phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / plan.rate;
         const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
                            std::sin(4.0 * phase + offset[1]);
-        out[i] += level * faded_bed_gain_at(spec, t) * std::tanh(sum) + kFloor * floor.next();
+        out[i] += level * faded_bed_gain_at(plan, t) * std::tanh(sum) + kFloor * floor.next();
     }
 }
 
 // strength: around 1. Starts at the sample nearest to t.
-void add_hit(const song_spec &spec, double t, double strength, noise &random,
+void add_hit(const song_spec &plan, double t, double strength, noise &random,
              std::vector<double> &out) {
-    const size_t first = static_cast<size_t>(std::llround(t * spec.rate));
-    const size_t length = static_cast<size_t>(kHitSeconds * spec.rate);
-    const double level = spec.drum_level * strength * gain_at(spec, t);
+    const size_t first = static_cast<size_t>(std::llround(t * plan.rate));
+    const size_t length = static_cast<size_t>(kHitSeconds * plan.rate);
+    const double level = plan.drum_level * strength * gain_at(plan, t);
     for (size_t i = 0; i < length; ++i) {
-        const double dt = static_cast<double>(i) / spec.rate;
+        const double dt = static_cast<double>(i) / plan.rate;
         const double burst = random.next() * std::exp(-dt / kNoiseDecay);
         const double kick = std::sin(kTwoPi * kKickHz * dt) * std::exp(-dt / kKickDecay);
         if (first + i < out.size()) out[first + i] += level * (0.8 * burst + 0.7 * kick);
@@ -103,34 +103,34 @@ int16_t to_sample(double value) {
 
 }  // namespace
 
-song make_song(const song_spec &spec) {
+song make_song(const song_spec &plan) {
     song made;
-    made.spec = spec;
-    const size_t frames = static_cast<size_t>(std::llround(spec.seconds * spec.rate));
-    const size_t channels = static_cast<size_t>(spec.channels);
+    made.plan = plan;
+    const size_t frames = static_cast<size_t>(std::llround(plan.seconds * plan.rate));
+    const size_t channels = static_cast<size_t>(plan.channels);
     for (int k = 0;; ++k) {
-        const double t = spec.first_hit + k * 60.0 / spec.bpm;
-        if (t >= spec.seconds) break;
+        const double t = plan.first_hit + k * 60.0 / plan.bpm;
+        if (t >= plan.seconds) break;
         made.beats.push_back(t);
-        if (t < spec.gap_from || t >= spec.gap_to) made.hits.push_back(t);
+        if (t < plan.gap_from || t >= plan.gap_to) made.hits.push_back(t);
     }
 
     std::vector<double> drums(frames, 0.0);
-    noise strengths = seeded(spec.seed, 1);
-    noise bursts = seeded(spec.seed, 2);
-    for (double t : made.hits) add_hit(spec, t, 1.0 + 0.15 * strengths.next(), bursts, drums);
+    noise strengths = seeded(plan.seed, 1);
+    noise bursts = seeded(plan.seed, 2);
+    for (double t : made.hits) add_hit(plan, t, 1.0 + 0.15 * strengths.next(), bursts, drums);
 
     made.pcm.resize(frames * channels);
     for (size_t c = 0; c < channels; ++c) {
         std::vector<double> mix = drums;
-        add_bed(spec, static_cast<int32_t>(c), mix);
+        add_bed(plan, static_cast<int32_t>(c), mix);
         for (size_t i = 0; i < frames; ++i) made.pcm[i * channels + c] = to_sample(mix[i]);
     }
     return made;
 }
 
 std::vector<int16_t> channel_of(const song &from, int32_t channel) {
-    const size_t channels = static_cast<size_t>(from.spec.channels);
+    const size_t channels = static_cast<size_t>(from.plan.channels);
     std::vector<int16_t> out;
     out.reserve(from.pcm.size() / channels);
     for (size_t i = static_cast<size_t>(channel); i < from.pcm.size(); i += channels) {

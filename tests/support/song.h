@@ -29,13 +29,13 @@ struct song_spec {
 };
 
 struct song {
-    song_spec spec;
+    song_spec plan;
     std::vector<int16_t> pcm;   // [frames * channels] interleaved
     std::vector<double> beats;  // seconds, the whole grid
     std::vector<double> hits;   // seconds, the audible ones
 };
 
-song make_song(const song_spec &spec);
+song make_song(const song_spec &plan);
 
 // The samples of one channel.
 std::vector<int16_t> channel_of(const song &from, int32_t channel);
@@ -55,7 +55,7 @@ struct wav_spec {
 };
 
 // A whole file of interleaved 16-bit samples in the wanted coding.
-std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &spec);
+std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &plan);
 
 // Both return false, with errno set, when the file cannot be written whole.
 bool write_bytes(const std::string &path, const std::vector<uint8_t> &bytes);

@@ -71,21 +71,21 @@ void put_sample(bytes &out, int16_t sample, wav_coding coding) {
     }
 }
 
-bytes format_chunk(const wav_spec &spec) {
-    const uint32_t size = static_cast<uint32_t>(bytes_per_sample(spec.coding));
-    const uint32_t tag = spec.coding == wav_coding::float32 ? kTagFloat : kTagPcm;
-    const uint32_t frame = size * static_cast<uint32_t>(spec.channels);
+bytes format_chunk(const wav_spec &plan) {
+    const uint32_t size = static_cast<uint32_t>(bytes_per_sample(plan.coding));
+    const uint32_t tag = plan.coding == wav_coding::float32 ? kTagFloat : kTagPcm;
+    const uint32_t frame = size * static_cast<uint32_t>(plan.channels);
     bytes body;
-    put(body, spec.extensible ? kTagExtensible : tag, 2);
-    put(body, static_cast<uint32_t>(spec.channels), 2);
-    put(body, static_cast<uint32_t>(spec.rate), 4);
-    put(body, static_cast<uint32_t>(spec.rate) * frame, 4);
+    put(body, plan.extensible ? kTagExtensible : tag, 2);
+    put(body, static_cast<uint32_t>(plan.channels), 2);
+    put(body, static_cast<uint32_t>(plan.rate), 4);
+    put(body, static_cast<uint32_t>(plan.rate) * frame, 4);
     put(body, frame, 2);
     put(body, size * 8, 2);
-    if (spec.extensible) {
+    if (plan.extensible) {
         put(body, 22, 2);                            // bytes that follow
         put(body, size * 8, 2);                      // bits in use
-        put(body, spec.channels == 1 ? 4U : 3U, 4);  // front centre, or left and right
+        put(body, plan.channels == 1 ? 4U : 3U, 4);  // front centre, or left and right
         put(body, tag, 2);
         body.insert(body.end(), kSubFormatTail, kSubFormatTail + sizeof(kSubFormatTail));
     }
@@ -108,18 +108,18 @@ uint32_t claimed_size(wav_data_size claim, uint32_t real) {
 
 }  // namespace
 
-std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &spec) {
+std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &plan) {
     bytes data;
-    data.reserve(pcm.size() * static_cast<size_t>(bytes_per_sample(spec.coding)));
-    for (int16_t sample : pcm) put_sample(data, sample, spec.coding);
+    data.reserve(pcm.size() * static_cast<size_t>(bytes_per_sample(plan.coding)));
+    for (int16_t sample : pcm) put_sample(data, sample, plan.coding);
 
     bytes out;
     put_tag(out, "RIFF");
     put(out, 0, 4);
     put_tag(out, "WAVE");
-    if (spec.junk_first) put_chunk(out, "JUNK", bytes(27, 0x55));
-    put_chunk(out, "fmt ", format_chunk(spec));
-    if (spec.other_chunks) {
+    if (plan.junk_first) put_chunk(out, "JUNK", bytes(27, 0x55));
+    put_chunk(out, "fmt ", format_chunk(plan));
+    if (plan.other_chunks) {
         // The odd bodies spell "data": a reader that forgets the padding finds a false chunk.
         put_chunk(out, "LIST", bytes{'I', 'N', 'F', 'O', 'd', 'a', 't', 'a', 1, 0, 0, 0, 7});
         put_chunk(out, "fact", bytes{0, 0, 0, 0});
@@ -127,14 +127,14 @@ std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &
     }
     put_tag(out, "data");
     const uint32_t real = static_cast<uint32_t>(data.size());
-    put(out, claimed_size(spec.data_size, real), 4);
+    put(out, claimed_size(plan.data_size, real), 4);
     out.insert(out.end(), data.begin(), data.end());
     if (data.size() % 2 != 0) out.push_back(0);
-    if (spec.other_chunks) put_chunk(out, "LIST", bytes{'I', 'N', 'F', 'O', 9});
+    if (plan.other_chunks) put_chunk(out, "LIST", bytes{'I', 'N', 'F', 'O', 9});
 
     const uint32_t riff = static_cast<uint32_t>(out.size() - 8);
     for (size_t i = 0; i < 4; ++i) out[4 + i] = static_cast<uint8_t>(riff >> (8 * i));
-    const size_t cut = static_cast<size_t>(spec.cut_bytes);
+    const size_t cut = static_cast<size_t>(plan.cut_bytes);
     out.resize(cut < out.size() ? out.size() - cut : 0);
     return out;
 }
@@ -147,10 +147,10 @@ bool write_bytes(const std::string &path, const std::vector<uint8_t> &content) {
 }
 
 bool write_wav(const std::string &path, const song &what) {
-    wav_spec spec;
-    spec.rate = what.spec.rate;
-    spec.channels = what.spec.channels;
-    return write_bytes(path, wav_bytes(what.pcm, spec));
+    wav_spec plan;
+    plan.rate = what.plan.rate;
+    plan.channels = what.plan.channels;
+    return write_bytes(path, wav_bytes(what.pcm, plan));
 }
 
 }  // namespace support
