@@ -60,7 +60,7 @@ flac --totally-silent --lax -0 -b 65535 -o noise.flac noise.wav
 # AAC: the encoder uses noise substitution unless told not to, the more the lower the rate
 convert song.wav low.aac -c:a aac -b:a 128k
 convert song.wav noisy.aac -c:a aac -b:a 48k
-convert song48.wav high.aac -c:a aac -b:a 320k
+convert song48.wav high.aac -c:a aac -b:a 320k -aac_pns 0
 convert mono.wav mono.aac -c:a aac -b:a 64k
 convert six.wav six.aac -c:a aac -b:a 384k
 convert mono.wav core.aac -c:a aac -b:a 32k -ar 22050
