@@ -61,6 +61,25 @@ bool reads_consistently(const std::string &path, std::mt19937 &random);
 // A callback record for a path, for calling the codec library directly.
 mtsrc_io io_for(const std::string &path);
 
+// A reader or demuxer of the codec library itself, without a source around it; null when the
+// library refuses the file.
+template <typename Info, typename Word, void *(*create)(const mtsrc_io *, Word *, Info *, void *),
+          void (*remove)(void *)>
+struct direct {
+    std::string path;
+    Info info = {};
+    void *reader = nullptr;
+
+    explicit direct(const std::string &file) : path(file) {
+        const mtsrc_io io = io_for(path);
+        Word word = 0;
+        reader = create(&io, &word, &info, nullptr);
+    }
+    ~direct() { remove(reader); }
+    direct(const direct &) = delete;
+    direct &operator=(const direct &) = delete;
+};
+
 }  // namespace codec_test
 
 #endif

@@ -21,20 +21,7 @@ constexpr size_t kFrame = 1024;
 constexpr size_t kDelay = 1024;  // sample pairs of the encoder, not removed
 constexpr int64_t kUnits = 10'000'000;
 
-struct direct {
-    std::string path;
-    xaac_info info = {};
-    void *reader = nullptr;
-
-    explicit direct(const std::string &file) : path(file) {
-        const mtsrc_io io = codec_test::io_for(path);
-        int64_t word = 0;
-        reader = xaacfd_create(&io, &word, &info, nullptr);
-    }
-    ~direct() { xaacfd_delete(reader); }
-    direct(const direct &) = delete;
-    direct &operator=(const direct &) = delete;
-};
+using direct = codec_test::direct<xaac_info, int64_t, xaacfd_create, xaacfd_delete>;
 
 // Mean square of the difference to a channel of a 16-bit WAV file, over a second in the middle.
 double distance(const samples &got, const bytes &wav, size_t channels, size_t channel) {

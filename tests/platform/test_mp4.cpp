@@ -18,20 +18,7 @@ using samples = std::vector<int16_t>;
 constexpr size_t kFrame = 1024;
 constexpr int64_t kUnits = 10'000'000;
 
-struct direct {
-    std::string path;
-    xmp4_info info = {};
-    void *demux = nullptr;
-
-    explicit direct(const std::string &file) : path(file) {
-        const mtsrc_io io = codec_test::io_for(path);
-        int32_t word = 0;
-        demux = xmp4fd_create(&io, &word, &info, nullptr);
-    }
-    ~direct() { xmp4fd_delete(demux); }
-    direct(const direct &) = delete;
-    direct &operator=(const direct &) = delete;
-};
+using direct = codec_test::direct<xmp4_info, int32_t, xmp4fd_create, xmp4fd_delete>;
 
 int32_t error_of(const std::string &path) {
     return codec_test::opened(path).error;
@@ -63,13 +50,13 @@ TEST(Mp4, LayoutOfTheFixturesIsAsMeant) {
     EXPECT_LT(find(first, "moov"), find(first, "mdat"));
     find(load(fixture("fragmented.mp4")), "moof");
     direct video(fixture("video.mp4"));
-    ASSERT_NE(video.demux, nullptr);
+    ASSERT_NE(video.reader, nullptr);
     ASSERT_EQ(video.info.track_count, 2);
     EXPECT_NE(video.info.kind[0], kWexaKindAudio);
     EXPECT_EQ(video.info.kind[1], kWexaKindAudio);
-    EXPECT_EQ(xmp4fds_open(video.demux, 0, nullptr), nullptr);
-    EXPECT_EQ(xmp4fds_open(video.demux, 2, nullptr), nullptr);
-    EXPECT_EQ(xmp4fds_open(video.demux, -1, nullptr), nullptr);
+    EXPECT_EQ(xmp4fds_open(video.reader, 0, nullptr), nullptr);
+    EXPECT_EQ(xmp4fds_open(video.reader, 2, nullptr), nullptr);
+    EXPECT_EQ(xmp4fds_open(video.reader, -1, nullptr), nullptr);
 }
 
 // The container's configuration says neither that the band is replicated nor the true rate.
@@ -81,8 +68,8 @@ TEST(Mp4, LearnsTheTruthAboutBandReplication) {
         "ffmpeg -nostdin -v error -y -i " + adts + " -c copy -bsf:a aac_adtstoasc -f mp4 " + path;
     ASSERT_EQ(std::system(command.c_str()), 0);
     direct file(path);
-    ASSERT_NE(file.demux, nullptr);
-    void *stream = xmp4fds_open(file.demux, 0, nullptr);
+    ASSERT_NE(file.reader, nullptr);
+    void *stream = xmp4fds_open(file.reader, 0, nullptr);
     xmp4_track track = {};
     ASSERT_EQ(xmp4fds_get_info_aud(stream, &track), 0);
     EXPECT_EQ(track.format_tag, kWexaTagAac);
@@ -137,7 +124,7 @@ TEST(Mp4, ConcealsDamagedFrames) {
 
 TEST(Mp4, FillsTheTagRecord) {
     direct file(fixture("tagged.m4a"));
-    ASSERT_NE(file.demux, nullptr);
+    ASSERT_NE(file.reader, nullptr);
     ASSERT_NE(file.info.tags, nullptr);
     EXPECT_STREQ(static_cast<char *>(file.info.tags->text[0].data), "A Title");
     EXPECT_STREQ(static_cast<char *>(file.info.tags->text[1].data), "An Artist");
@@ -154,7 +141,7 @@ TEST(Mp4, RefusesOtherCodecsAndSilentFiles) {
 
 TEST(Mp4, DurationIsTheTracks) {
     direct file(fixture("video.mp4"));
-    ASSERT_NE(file.demux, nullptr);
+    ASSERT_NE(file.reader, nullptr);
     EXPECT_EQ(file.info.duration * 44100 / kUnits,
               static_cast<int64_t>(read_all(fixture("low.aac")).size()));
 }

@@ -208,20 +208,7 @@ TEST(MpegAudio, CountsWhatACutFileHolds) {
     codec_test::expect_exact_seams(save("tail.mp3", tail));
 }
 
-struct direct {
-    std::string path;
-    xmp123_info info = {};
-    void *reader = nullptr;
-
-    explicit direct(const std::string &file) : path(file) {
-        const mtsrc_io io = codec_test::io_for(path);
-        int64_t word = 0;
-        reader = xmp123fd_create(&io, &word, &info, nullptr);
-    }
-    ~direct() { xmp123fd_delete(reader); }
-    direct(const direct &) = delete;
-    direct &operator=(const direct &) = delete;
-};
+using direct = codec_test::direct<xmp123_info, int64_t, xmp123fd_create, xmp123fd_delete>;
 
 TEST(MpegAudio, MarksTheFirstFrameOnly) {
     direct file(fixture("vbr.mp3"));

@@ -20,20 +20,7 @@ using samples = std::vector<int16_t>;
 constexpr int64_t kLongBlock = 1024;  // samples of the packets of these files at most
 constexpr int64_t kUnits = 10'000'000;
 
-struct direct {
-    std::string path;
-    xogg_info info = {};
-    void *demux = nullptr;
-
-    explicit direct(const std::string &file) : path(file) {
-        const mtsrc_io io = codec_test::io_for(path);
-        int64_t word = 0;
-        demux = xoggd_create(&io, &word, &info, nullptr);
-    }
-    ~direct() { xoggd_delete(demux); }
-    direct(const direct &) = delete;
-    direct &operator=(const direct &) = delete;
-};
+using direct = codec_test::direct<xogg_info, int64_t, xoggd_create, xoggd_delete>;
 
 struct place {
     size_t offset, size;
@@ -116,12 +103,12 @@ TEST(Ogg, DeliversTheMeanOfTheChannels) {
 TEST(Ogg, GivesTheSameSamplesBesideAnotherStream) {
     EXPECT_EQ(read_all(fixture("video.ogv")), read_all(fixture("song.ogg")));
     direct file(fixture("video.ogv"));
-    ASSERT_NE(file.demux, nullptr);
+    ASSERT_NE(file.reader, nullptr);
     ASSERT_EQ(file.info.stream_count, 2);
     EXPECT_NE(file.info.kind[0], kWexaKindAudio);
     EXPECT_EQ(file.info.kind[1], kWexaKindAudio);
-    EXPECT_EQ(xoggds_open(file.demux, 0, nullptr), nullptr);
-    EXPECT_NE(xoggds_open(file.demux, 1, nullptr), nullptr);
+    EXPECT_EQ(xoggds_open(file.reader, 0, nullptr), nullptr);
+    EXPECT_NE(xoggds_open(file.reader, 1, nullptr), nullptr);
 }
 
 TEST(Ogg, StopsWhereASecondStreamIsChained) {
@@ -235,13 +222,13 @@ TEST(Ogg, CountsWhatACutFileHolds) {
 
 TEST(Ogg, FillsTheRecords) {
     direct file(fixture("song.ogg"));
-    ASSERT_NE(file.demux, nullptr);
+    ASSERT_NE(file.reader, nullptr);
     EXPECT_EQ(file.info.duration, 12 * kUnits);
     ASSERT_NE(file.info.tags, nullptr);
     EXPECT_STREQ(static_cast<char *>(file.info.tags->text[0].data), "A Title");
     EXPECT_STREQ(static_cast<char *>(file.info.tags->text[1].data), "An Artist");
     EXPECT_STREQ(static_cast<char *>(file.info.tags->text[2].data), "An Album");
-    void *stream = xoggds_open(file.demux, 0, nullptr);
+    void *stream = xoggds_open(file.reader, 0, nullptr);
     xogg_stream info = {};
     ASSERT_EQ(xoggds_get_info_aud(stream, &info), 0);
     EXPECT_EQ(info.codec, 323);
