@@ -361,53 +361,22 @@ void on_event(std::function<void()> action) {
     event_action = std::move(action);
 }
 
-std::vector<std::string> calls() {
+record seen() {
     guard hold(lock);
-    return call_list;
+    return {call_list,
+            event_list,
+            violation_list,
+            log_list,
+            count(ref_kind::global),
+            count(ref_kind::local),
+            static_cast<int>(characters.size()),
+            attached,
+            pending};
 }
 
 void forget_calls() {
     guard hold(lock);
     call_list.clear();
-}
-
-std::vector<event> events() {
-    guard hold(lock);
-    return event_list;
-}
-
-std::vector<std::string> violations() {
-    guard hold(lock);
-    return violation_list;
-}
-
-int global_references() {
-    guard hold(lock);
-    return count(ref_kind::global);
-}
-
-int local_references() {
-    guard hold(lock);
-    return count(ref_kind::local);
-}
-
-int held_characters() {
-    guard hold(lock);
-    return static_cast<int>(characters.size());
-}
-
-int attached_threads() {
-    guard hold(lock);
-    return attached;
-}
-
-bool exception_pending() {
-    return pending;
-}
-
-std::vector<std::string> log_lines() {
-    guard hold(lock);
-    return log_list;
 }
 
 void forget_log() {

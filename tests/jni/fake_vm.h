@@ -36,18 +36,20 @@ void fail(const std::string &function, int nth = 1);
 // Runs inside the Java method, on its thread.
 void on_event(std::function<void()> action);
 
-std::vector<std::string> calls();
+// What the machine has seen, and what is out of it at this moment.
+struct record {
+    std::vector<std::string> calls;
+    std::vector<event> events;
+    std::vector<std::string> violations;  // "function: what was wrong"
+    std::vector<std::string> log;         // as a device would show it: "priority/tag: text"
+    int global_references;
+    int local_references;  // without those that new_object and new_string made
+    int held_characters;
+    int attached_threads;    // attached by the bridge and not detached
+    bool exception_pending;  // on the calling thread
+};
+record seen();
 void forget_calls();
-std::vector<event> events();
-std::vector<std::string> violations();  // "function: what was wrong"
-int global_references();
-int local_references();  // without those that new_object and new_string made
-int held_characters();
-int attached_threads();    // attached by the bridge and not detached
-bool exception_pending();  // on the calling thread
-
-// ---- log lines, as a device would show them: "priority/tag: text" ----
-std::vector<std::string> log_lines();
 void forget_log();
 
 }  // namespace fake_vm

@@ -36,7 +36,8 @@ jint deinit() {
 // The bridge's own lines since the last look.
 lines bridge_lines() {
     lines found;
-    for (const std::string &line : fake_vm::log_lines()) {
+    const lines log = fake_vm::seen().log;
+    for (const std::string &line : log) {
         if (line.find("/tavo_jni: ") != std::string::npos) found.push_back(line);
     }
     fake_vm::forget_log();
@@ -55,10 +56,10 @@ std::string number_in(const std::string &line, const std::string &before,
 }
 
 bool wait_for_event() {
-    for (int ms = 0; ms < 120'000 && fake_vm::events().empty(); ++ms) {
+    for (int ms = 0; ms < 120'000 && fake_vm::seen().events.empty(); ++ms) {
         std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
-    return !fake_vm::events().empty();
+    return !fake_vm::seen().events.empty();
 }
 
 void call_back_on_a_thread(TAVO_INFO info) {
@@ -93,12 +94,12 @@ struct Jni : testing::Test {
     }
     void TearDown() override {
         EXPECT_EQ(deinit(), 0);
-        EXPECT_EQ(fake_vm::violations(), lines());
-        EXPECT_EQ(fake_vm::held_characters(), 0);
-        EXPECT_EQ(fake_vm::attached_threads(), 0);
-        EXPECT_EQ(fake_vm::local_references(), 0);
-        EXPECT_EQ(fake_vm::global_references(), 2);
-        EXPECT_FALSE(fake_vm::exception_pending());
+        EXPECT_EQ(fake_vm::seen().violations, lines());
+        EXPECT_EQ(fake_vm::seen().held_characters, 0);
+        EXPECT_EQ(fake_vm::seen().attached_threads, 0);
+        EXPECT_EQ(fake_vm::seen().local_references, 0);
+        EXPECT_EQ(fake_vm::seen().global_references, 2);
+        EXPECT_FALSE(fake_vm::seen().exception_pending);
     }
     static void TearDownTestSuite() { unlink(song_path().c_str()); }
     jobject object = nullptr;
@@ -118,21 +119,21 @@ TEST(JniBeforeSetup, EveryCallIsHarmless) {
     tavocallback(&info);  // no host
     EXPECT_EQ(bridge_lines(),
               lines({"6/tavo_jni: An exception occurred while notifying an event."}));
-    EXPECT_TRUE(fake_vm::events().empty());
+    EXPECT_TRUE(fake_vm::seen().events.empty());
 
     EXPECT_EQ(analyze(), 0);
     EXPECT_EQ(bridge_lines(), lines());
     EXPECT_EQ(deinit(), 0);
     EXPECT_EQ(bridge_lines(), lines({"6/tavo_jni: tavo_deinit() is failed. no instance"}));
     EXPECT_EQ(tavo_jni_mutex, nullptr);
-    EXPECT_EQ(fake_vm::violations(), lines());
+    EXPECT_EQ(fake_vm::seen().violations, lines());
 }
 
 TEST_F(Jni, LifecycleAnswersAndLogsAsItIs) {
     ASSERT_EQ(init(song_path(), 0), 0);
     EXPECT_EQ(bridge_lines(), lines({"2/tavo_jni: tavo_init and setcallback is finished"}));
-    EXPECT_EQ(fake_vm::calls(), lines({"GetStringUTFChars", "ReleaseStringUTFChars", "FindClass",
-                                       "GetStaticMethodID", "DeleteLocalRef"}));
+    EXPECT_EQ(fake_vm::seen().calls, lines({"GetStringUTFChars", "ReleaseStringUTFChars",
+                                            "FindClass", "GetStaticMethodID", "DeleteLocalRef"}));
     EXPECT_NE(tavo_jni_mutex, nullptr);
 
     EXPECT_EQ(init(song_path(), 1), kBusy);
@@ -149,11 +150,11 @@ TEST_F(Jni, LifecycleAnswersAndLogsAsItIs) {
     EXPECT_EQ(deinit(), 0);
     EXPECT_EQ(bridge_lines(),
               lines({"2/tavo_jni: tavo_deinit(" + id + ") is finished successfully"}));
-    EXPECT_EQ(fake_vm::events().size(), 1u);
+    EXPECT_EQ(fake_vm::seen().events.size(), 1u);
     EXPECT_EQ(deinit(), 0);
     EXPECT_EQ(bridge_lines(), lines({"6/tavo_jni: tavo_deinit() is failed. no instance"}));
     EXPECT_EQ(analyze(), 0);
-    EXPECT_EQ(fake_vm::events().size(), 1u);
+    EXPECT_EQ(fake_vm::seen().events.size(), 1u);
 }
 
 TEST_F(Jni, AFailedInitLeavesNoInstance) {
@@ -170,15 +171,15 @@ TEST_F(Jni, AFailedInitLeavesNoInstance) {
         if (each.function != nullptr) fake_vm::fail(each.function);
         EXPECT_EQ(init(each.path, 0), -4);
         EXPECT_EQ(bridge_lines(), lines({"6/tavo_jni: tavo_init is failed. error=-4"}));
-        EXPECT_FALSE(fake_vm::exception_pending());
-        EXPECT_EQ(fake_vm::held_characters(), 0);
+        EXPECT_FALSE(fake_vm::seen().exception_pending);
+        EXPECT_EQ(fake_vm::seen().held_characters, 0);
         EXPECT_EQ(deinit(), 0);
         EXPECT_EQ(bridge_lines(), lines({"6/tavo_jni: tavo_deinit() is failed. no instance"}));
     }
     fake_vm::forget_calls();
     EXPECT_EQ(Java_com_kestu_tavo_Tavo_init(fake_vm::environment(), object, nullptr, 0), -4);
     EXPECT_EQ(bridge_lines(), lines({"6/tavo_jni: tavo_init is failed. error=-4"}));
-    const lines called = fake_vm::calls();
+    const lines called = fake_vm::seen().calls;
     EXPECT_EQ(std::count(called.begin(), called.end(), "GetStringUTFChars"), 0);
 
     EXPECT_EQ(init(song_path(), 0), 0);
@@ -192,12 +193,12 @@ TEST_F(Jni, AFailedSetupKeepsTheEarlierHost) {
         fake_vm::fail(function, nth);
         Java_com_kestu_tavo_Tavo_native_1setup(fake_vm::environment(), object, object);
         EXPECT_EQ(bridge_lines(), lines({"6/tavo_jni: Can't find com/kestu/tavo/Tavo"}));
-        EXPECT_FALSE(fake_vm::exception_pending());
-        EXPECT_EQ(fake_vm::global_references(), 2);
+        EXPECT_FALSE(fake_vm::seen().exception_pending);
+        EXPECT_EQ(fake_vm::seen().global_references, 2);
     }
     ASSERT_EQ(init(song_path(), 0), 0);
     call_back_on_a_thread({});
-    EXPECT_EQ(fake_vm::events().size(), 1u);
+    EXPECT_EQ(fake_vm::seen().events.size(), 1u);
 }
 
 TEST_F(Jni, EventsCarryTheResult) {
@@ -221,7 +222,7 @@ TEST_F(Jni, EventsCarryTheResult) {
             fake_vm::forget_calls();
             TAVO_INFO info = each.info;
             own_thread ? tavocallback(&info) : call_back_on_a_thread(info);
-            const fake_vm::event got = fake_vm::events().back();
+            const fake_vm::event got = fake_vm::seen().events.back();
             EXPECT_NE(got.object, nullptr);
             EXPECT_EQ(got.what, each.what);
             EXPECT_EQ(got.arg1, each.arg1);
@@ -237,10 +238,10 @@ TEST_F(Jni, EventsCarryTheResult) {
             if (each.beats) expected.push_back("DeleteLocalRef");
             expected.push_back("ExceptionCheck");
             if (!own_thread) expected.push_back("DetachCurrentThread");
-            EXPECT_EQ(fake_vm::calls(), expected);
+            EXPECT_EQ(fake_vm::seen().calls, expected);
         }
     }
-    EXPECT_EQ(fake_vm::events().size(), 2 * std::size(cases));
+    EXPECT_EQ(fake_vm::seen().events.size(), 2 * std::size(cases));
 }
 
 TEST_F(Jni, EventsSurviveWhatFailsOnTheWay) {
@@ -261,12 +262,12 @@ TEST_F(Jni, EventsSurviveWhatFailsOnTheWay) {
     for (const auto &each : cases) {
         SCOPED_TRACE(each.function);
         fake_vm::fail(each.function);
-        const size_t before = fake_vm::events().size();
+        const size_t before = fake_vm::seen().events.size();
         call_back_on_a_thread({7000, 2, times, 0});
         EXPECT_EQ(bridge_lines(), lines({each.line}));
-        ASSERT_EQ(fake_vm::events().size() - before, each.what != 0 ? 1u : 0u);
+        ASSERT_EQ(fake_vm::seen().events.size() - before, each.what != 0 ? 1u : 0u);
         if (each.what == 0) continue;
-        const fake_vm::event got = fake_vm::events().back();
+        const fake_vm::event got = fake_vm::seen().events.back();
         EXPECT_EQ(got.what, each.what);
         EXPECT_EQ(got.arg1, 7000);
         EXPECT_EQ(got.arg2, each.arg2);
@@ -278,23 +279,23 @@ TEST_F(Jni, ARepeatedSetupReplacesItsReferences) {
     ASSERT_EQ(init(song_path(), 0), 0);
     call_back_on_a_thread({});
     setup(fake_vm::new_object());
-    EXPECT_EQ(fake_vm::global_references(), 2);
+    EXPECT_EQ(fake_vm::seen().global_references, 2);
 
     // In the middle of an event, the references that it uses live on until it has returned.
     fake_vm::on_event([] { setup(fake_vm::new_object()); });
     call_back_on_a_thread({});
-    EXPECT_EQ(fake_vm::global_references(), 2);
+    EXPECT_EQ(fake_vm::seen().global_references, 2);
     fake_vm::on_event(nullptr);
     call_back_on_a_thread({});
-    const std::vector<fake_vm::event> events = fake_vm::events();
+    const std::vector<fake_vm::event> events = fake_vm::seen().events;
     ASSERT_EQ(events.size(), 3u);
     EXPECT_NE(events[0].object, events[1].object);
     EXPECT_NE(events[1].object, events[2].object);
 
     setup(nullptr);  // a null object is passed on as null
-    EXPECT_EQ(fake_vm::global_references(), 1);
+    EXPECT_EQ(fake_vm::seen().global_references, 1);
     call_back_on_a_thread({});
-    EXPECT_EQ(fake_vm::events().back().object, nullptr);
+    EXPECT_EQ(fake_vm::seen().events.back().object, nullptr);
     setup(object);
 }
 
@@ -307,16 +308,16 @@ TEST_F(Jni, ARealJobPostsOneEventFromAThreadOfItsOwn) {
         ASSERT_EQ(analyze(), 0);
         ASSERT_TRUE(wait_for_event());
         EXPECT_EQ(deinit(), 0);
-        ASSERT_EQ(fake_vm::events().size(), 1u);
-        const fake_vm::event got = fake_vm::events()[0];
+        ASSERT_EQ(fake_vm::seen().events.size(), 1u);
+        const fake_vm::event got = fake_vm::seen().events[0];
         EXPECT_EQ(got.what, 1);
         EXPECT_TRUE(got.on_attached_thread);
         EXPECT_EQ(got.arg1 != 0, mode != 1);
         EXPECT_EQ(got.arg2 >= 1, mode != 0);
         EXPECT_EQ(got.beats.size(), static_cast<size_t>(got.arg2));
         EXPECT_TRUE(std::is_sorted(got.beats.begin(), got.beats.end()));
-        EXPECT_EQ(fake_vm::attached_threads(), 0);
-        EXPECT_EQ(fake_vm::violations(), lines());
+        EXPECT_EQ(fake_vm::seen().attached_threads, 0);
+        EXPECT_EQ(fake_vm::seen().violations, lines());
     }
 }
 
@@ -366,7 +367,7 @@ TEST_F(Jni, SetupMayRaceWithEvents) {
     });
     for (int i = 0; i < 200; ++i) call_back_on_a_thread({});
     setups.join();
-    EXPECT_EQ(fake_vm::events().size(), 200u);
+    EXPECT_EQ(fake_vm::seen().events.size(), 200u);
 }
 
 }  // namespace

@@ -15,7 +15,6 @@ namespace {
 constexpr int32_t kRequest = 8192;       // bytes, the pipeline's own
 constexpr size_t kSeamSamples = 30'000;  // compared behind each seek
 constexpr size_t kSeams = 40;
-constexpr int64_t kUnits = 10'000'000;  // per second
 
 // Files that the running program saved; removed when it ends.
 struct saved_files {
@@ -64,11 +63,11 @@ opened::~opened() {
     }
 }
 
-std::vector<int16_t> read(mtsrc_ctx *source, size_t limit, bool *end) {
-    std::vector<int16_t> samples;
-    std::vector<int16_t> piece(kRequest / 2);
+samples read(mtsrc_ctx *source, size_t limit, bool *end) {
+    samples all;
+    samples piece(kRequest / 2);
     bool ended = false;
-    while (!ended && samples.size() < limit) {
+    while (!ended && all.size() < limit) {
         mtsrc_frame frame = {piece.data(), 0};
         const int32_t code = mtsrc_getstream(source, kRequest, &frame);
         if (code != 0 && code != 1) {
@@ -76,24 +75,30 @@ std::vector<int16_t> read(mtsrc_ctx *source, size_t limit, bool *end) {
             break;
         }
         ended = code == 1;
-        samples.insert(samples.end(), piece.begin(), piece.begin() + frame.size / 2);
+        all.insert(all.end(), piece.begin(), piece.begin() + frame.size / 2);
     }
-    samples.resize(std::min(samples.size(), limit));
+    all.resize(std::min(all.size(), limit));
     if (end != nullptr) {
         *end = ended;
     }
-    return samples;
+    return all;
 }
 
-std::vector<int16_t> read_all(const std::string &path) {
+samples read_all(const std::string &path) {
     opened file(path);
     EXPECT_NE(file.source, nullptr) << path << ": " << file.error;
-    return file.source != nullptr ? read(file.source, SIZE_MAX) : std::vector<int16_t>{};
+    return file.source != nullptr ? read(file.source, SIZE_MAX) : samples{};
+}
+
+void expect_same(const samples &got, const samples &wanted, size_t from, size_t to) {
+    ASSERT_GE(got.size(), to);
+    ASSERT_GE(wanted.size(), to);
+    for (size_t i = from; i < to; ++i) ASSERT_EQ(got[i], wanted[i]) << "sample " << i;
 }
 
 void expect_exact_seams(const std::string &path) {
     SCOPED_TRACE(path);
-    const std::vector<int16_t> linear = read_all(path);
+    const samples linear = read_all(path);
     opened file(path);
     ASSERT_NE(file.source, nullptr) << file.error;
     ASSERT_GT(linear.size(), 0U);
@@ -123,7 +128,7 @@ void expect_exact_seams(const std::string &path) {
         ASSERT_EQ(mtsrc_seekstream(file.source, reached, &again), 0);
         ASSERT_EQ(again, reached);
         const size_t wanted = std::min(static_cast<size_t>(left), kSeamSamples);
-        const std::vector<int16_t> got = read(file.source, kSeamSamples);
+        const samples got = read(file.source, kSeamSamples);
         ASSERT_EQ(got.size(), wanted);
         const auto differs = std::mismatch(got.begin(), got.end(), linear.begin() + sample);
         ASSERT_EQ(differs.first - got.begin(), static_cast<ptrdiff_t>(wanted)) << sample;
@@ -183,7 +188,7 @@ bool reads_consistently(const std::string &path, std::mt19937 &random) {
     const int64_t rate = file.format.sample_rate;
     const int64_t duration = file.format.duration;
     EXPECT_GE(duration, 0);
-    const std::vector<int16_t> linear = read(file.source, SIZE_MAX);
+    const samples linear = read(file.source, SIZE_MAX);
     EXPECT_EQ(duration * rate / kUnits, static_cast<int64_t>(linear.size()));
     for (int k = 0; k < 4; ++k) {
         const int64_t position =

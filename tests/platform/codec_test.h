@@ -15,6 +15,9 @@
 namespace codec_test {
 
 using bytes = std::vector<uint8_t>;
+using samples = std::vector<int16_t>;
+
+constexpr int64_t kUnits = 10'000'000;  // per second
 
 // Path of a fixture by its name.
 std::string fixture(const std::string &name);
@@ -39,10 +42,13 @@ struct opened {
 
 // Reads up to limit samples from where the source stands. *end: the source reported the end of the
 // stream. Any failure code fails the test.
-std::vector<int16_t> read(mtsrc_ctx *source, size_t limit, bool *end = nullptr);
+samples read(mtsrc_ctx *source, size_t limit, bool *end = nullptr);
 
 // All of a file's samples.
-std::vector<int16_t> read_all(const std::string &path);
+samples read_all(const std::string &path);
+
+// The same samples in [from, to).
+void expect_same(const samples &got, const samples &wanted, size_t from, size_t to);
 
 // The stream's duration is exact: the samples of a linear read. A seek to each of 40 places reports
 // the first sample at or after it, and delivers from there what a linear read delivers there. The

@@ -11,15 +11,16 @@ namespace {
 
 using codec_test::adts_frames;
 using codec_test::bytes;
+using codec_test::expect_same;
 using codec_test::fixture;
+using codec_test::kUnits;
 using codec_test::load;
 using codec_test::read_all;
+using codec_test::samples;
 using codec_test::save;
-using samples = std::vector<int16_t>;
 
 constexpr size_t kFrame = 1024;
 constexpr size_t kDelay = 1024;  // sample pairs of the encoder, not removed
-constexpr int64_t kUnits = 10'000'000;
 
 using direct = codec_test::direct<xaac_info, int64_t, xaacfd_create, xaacfd_delete>;
 
@@ -34,24 +35,6 @@ double distance(const samples &got, const bytes &wav, size_t channels, size_t ch
     }
     return sum / 44100;
 }
-
-void expect_same(const samples &got, const samples &wanted, size_t from, size_t to) {
-    ASSERT_GE(got.size(), to);
-    ASSERT_GE(wanted.size(), to);
-    for (size_t i = from; i < to; ++i) {
-        ASSERT_EQ(got[i], wanted[i]) << "sample " << i;
-    }
-}
-
-class AacSeams : public testing::TestWithParam<const char *> {};
-
-TEST_P(AacSeams, AreExact) {
-    codec_test::expect_exact_seams(fixture(GetParam()));
-}
-
-INSTANTIATE_TEST_SUITE_P(Files, AacSeams,
-                         testing::Values("low.aac", "noisy.aac", "high.aac", "mono.aac", "six.aac",
-                                         "core.aac"));
 
 TEST(Aac, CountsEveryFrame) {
     const std::vector<size_t> at = adts_frames(load(fixture("low.aac")));
@@ -250,9 +233,7 @@ TEST(Aac, TellsTheRateOfAFrame) {
     }
 }
 
-TEST(Aac, RefusesNoise) {
-    EXPECT_EQ(direct(save("none.aac", bytes(100000, 0xFF))).reader, nullptr);
-    EXPECT_EQ(direct(save("none.aac", bytes(3, 0))).reader, nullptr);
+TEST(Aac, RefusesCutAdif) {
     bytes adif = codec_test::as_adif(load(fixture("low.aac")));
     for (const size_t size : {4U, 10U, 20U}) {
         adif.resize(size);

@@ -10,12 +10,11 @@ namespace {
 
 using codec_test::bytes;
 using codec_test::fixture;
+using codec_test::kUnits;
 using codec_test::load;
 using codec_test::read_all;
+using codec_test::samples;
 using codec_test::save;
-using samples = std::vector<int16_t>;
-
-constexpr int64_t kUnits = 10'000'000;
 
 // Check sums by the definition, bit for bit.
 uint32_t crc(const uint8_t *p, size_t n, uint32_t poly, int bits) {
@@ -122,17 +121,6 @@ samples rounded_left(const std::string &path) {
     }
     return out;
 }
-
-class FlacFiles : public testing::TestWithParam<const char *> {};
-
-TEST_P(FlacFiles, HaveExactSeams) {
-    codec_test::expect_exact_seams(fixture(GetParam()));
-}
-
-INSTANTIATE_TEST_SUITE_P(Files, FlacFiles,
-                         testing::Values("song.flac", "no_table.flac", "short_blocks.flac",
-                                         "huge_blocks.flac", "mono.flac", "six.flac", "wide.flac",
-                                         "noise.flac"));
 
 TEST(Flac, GivesTheSamplesThatWereEncoded) {
     const samples song = read_all(fixture("song.wav"));
@@ -280,8 +268,6 @@ TEST(Flac, FillsTheTagRecord) {
     void *reader = xflacfd_create(&io, &word, &info, nullptr);
     ASSERT_NE(reader, nullptr);
     ASSERT_NE(info.tags, nullptr);
-    EXPECT_STREQ(static_cast<char *>(info.tags->text[0].data), "A Title");
-    EXPECT_STREQ(static_cast<char *>(info.tags->text[1].data), "An Artist");
     EXPECT_STREQ(static_cast<char *>(info.tags->entry[0].first), "KEY");
     EXPECT_STREQ(static_cast<char *>(info.tags->entry[0].second), "Am");
     EXPECT_NE(info.tags->last, nullptr);

@@ -10,16 +10,17 @@
 namespace {
 
 using codec_test::bytes;
+using codec_test::expect_same;
 using codec_test::fixture;
+using codec_test::kUnits;
 using codec_test::load;
 using codec_test::read_all;
+using codec_test::samples;
 using codec_test::save;
-using samples = std::vector<int16_t>;
 
 constexpr int32_t kDelay = 529;    // sample pairs that the source drops at 44.1 kHz stereo
 constexpr int32_t kFrame = 1152;   // samples of a Layer II or MPEG-1 Layer III frame
 constexpr size_t kCbrFrame = 417;  // bytes at 128 kbit/s, 44.1 kHz, unpadded
-constexpr int64_t kUnits = 10'000'000;
 
 // Sizes of the frames of a constant-rate 128-kbit/s file at 44.1 kHz: 417 and the padding bit.
 std::vector<size_t> cbr_frames(const bytes &file) {
@@ -31,14 +32,6 @@ std::vector<size_t> cbr_frames(const bytes &file) {
     return at;
 }
 
-void expect_same(const samples &got, const samples &wanted, size_t from, size_t to) {
-    ASSERT_GE(got.size(), to);
-    ASSERT_GE(wanted.size(), to);
-    for (size_t i = from; i < to; ++i) {
-        ASSERT_EQ(got[i], wanted[i]) << "sample " << i;
-    }
-}
-
 bytes joined(const bytes &a, const bytes &b) {
     bytes out = a;
     out.insert(out.end(), b.begin(), b.end());
@@ -47,32 +40,14 @@ bytes joined(const bytes &a, const bytes &b) {
 
 // An ID3v2.3 tag whose body looks like frames of another stream.
 bytes false_tag(size_t size) {
-    bytes tag = {'I',
-                 'D',
-                 '3',
-                 3,
-                 0,
-                 0,
-                 0,
-                 0,
-                 static_cast<uint8_t>(size >> 7),
-                 static_cast<uint8_t>(size & 0x7F)};
+    bytes tag = {'I', 'D', '3', 3, 0, 0, 0, 0};
+    tag.push_back(static_cast<uint8_t>(size >> 7));
+    tag.push_back(static_cast<uint8_t>(size & 0x7F));
     while (tag.size() < 10 + size) {
         tag.push_back(tag.size() % 104 == 10 ? 0xFF : tag.size() % 104 == 11 ? 0xFB : 0x10);
     }
     return tag;
 }
-
-class MpegSeams : public testing::TestWithParam<const char *> {};
-
-TEST_P(MpegSeams, AreExact) {
-    codec_test::expect_exact_seams(fixture(GetParam()));
-}
-
-INSTANTIATE_TEST_SUITE_P(Files, MpegSeams,
-                         testing::Values("cbr.mp3", "cbr48.mp3", "vbr.mp3", "vbr_no_table.mp3",
-                                         "checked.mp3", "mono.mp3", "lsf.mp3", "low.mp3",
-                                         "tagged.mp3", "layer2.mp2"));
 
 // The encoder delays by 576 samples, the decoder by 529 of which the source drops as many: the song
 // comes 576 samples late, at no other offset so near.
@@ -229,17 +204,13 @@ TEST(MpegAudio, MarksTheFirstFrameOnly) {
     }
 }
 
-TEST(MpegAudio, FillsTheTagRecord) {
+TEST(MpegAudio, FillsTheRestOfTheTagRecord) {
     direct file(fixture("tagged.mp3"));
     ASSERT_NE(file.reader, nullptr);
     wexa_tags *tags = file.info.tags;
     ASSERT_NE(tags, nullptr);
-    const char *wanted[] = {"A Title", "An Artist", "An Album", nullptr, "1999", "3/9"};
-    for (size_t i = 0; i < 6; ++i) {
-        if (wanted[i] != nullptr) {
-            EXPECT_STREQ(static_cast<char *>(tags->text[i].data), wanted[i]);
-        }
-    }
+    EXPECT_STREQ(static_cast<char *>(tags->text[4].data), "1999");
+    EXPECT_STREQ(static_cast<char *>(tags->text[5].data), "3/9");
     EXPECT_STREQ(static_cast<char *>(tags->text[7].data), "A comment");
     EXPECT_NE(tags->last, nullptr);  // the encoder names itself
     free(tags->text[0].data);        // as a source does; the rest is the reader's to free
@@ -284,14 +255,12 @@ TEST(MpegAudio, ReadsTagsOfEveryVersionAndEncoding) {
     }
 }
 
-TEST(MpegAudio, RefusesFreeFormatAndNoise) {
+TEST(MpegAudio, RefusesFreeFormat) {
     bytes free_format = load(fixture("cbr.mp3"));
     for (const size_t i : cbr_frames(free_format)) {
         free_format[i + 2] &= 0x0F;
     }
     EXPECT_EQ(direct(save("free.mp3", free_format)).reader, nullptr);
-    EXPECT_EQ(direct(save("none.mp3", bytes(100000, 0xFF))).reader, nullptr);
-    EXPECT_EQ(direct(save("none.mp3", bytes(100, 0))).reader, nullptr);
 }
 
 // Layer I frames of 448 kbit/s in which every subband of both channels has 3-bit samples: any bits

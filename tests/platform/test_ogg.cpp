@@ -12,13 +12,13 @@ namespace {
 
 using codec_test::bytes;
 using codec_test::fixture;
+using codec_test::kUnits;
 using codec_test::load;
 using codec_test::read_all;
+using codec_test::samples;
 using codec_test::save;
-using samples = std::vector<int16_t>;
 
 constexpr int64_t kLongBlock = 1024;  // samples of the packets of these files at most
-constexpr int64_t kUnits = 10'000'000;
 
 using direct = codec_test::direct<xogg_info, int64_t, xoggd_create, xoggd_delete>;
 
@@ -64,16 +64,6 @@ bytes with_granules(bytes file, const std::function<int64_t(int64_t granule, boo
     }
     return file;
 }
-
-class OggSeams : public testing::TestWithParam<const char *> {};
-
-TEST_P(OggSeams, AreExact) {
-    codec_test::expect_exact_seams(fixture(GetParam()));
-}
-
-INSTANTIATE_TEST_SUITE_P(Files, OggSeams,
-                         testing::Values("song.ogg", "other.ogg", "mono.ogg", "six.ogg",
-                                         "video.ogv"));
 
 // Vorbis has no delay: as many samples as were encoded, each in its place, the channels' mean.
 TEST(Ogg, DeliversTheMeanOfTheChannels) {
@@ -224,10 +214,6 @@ TEST(Ogg, FillsTheRecords) {
     direct file(fixture("song.ogg"));
     ASSERT_NE(file.reader, nullptr);
     EXPECT_EQ(file.info.duration, 12 * kUnits);
-    ASSERT_NE(file.info.tags, nullptr);
-    EXPECT_STREQ(static_cast<char *>(file.info.tags->text[0].data), "A Title");
-    EXPECT_STREQ(static_cast<char *>(file.info.tags->text[1].data), "An Artist");
-    EXPECT_STREQ(static_cast<char *>(file.info.tags->text[2].data), "An Album");
     void *stream = xoggds_open(file.reader, 0, nullptr);
     xogg_stream info = {};
     ASSERT_EQ(xoggds_get_info_aud(stream, &info), 0);

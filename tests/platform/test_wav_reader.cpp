@@ -10,9 +10,10 @@
 namespace {
 
 using codec_test::bytes;
+using codec_test::kUnits;
+using codec_test::samples;
 
 constexpr int32_t kChunk = 16384;  // bytes, the source's buffer
-constexpr int64_t kUnits = 10'000'000;
 
 struct reader {
     std::string path;
