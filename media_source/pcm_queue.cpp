@@ -6,6 +6,9 @@
 namespace {
 
 constexpr int32_t kBytesPerSample = 2;
+// In a row: some 40 minutes of MPEG frames without a sample. A reader that hands out nothing for
+// longer hands it out for ever.
+constexpr int32_t kMaxEmptySteps = 100'000;
 
 void make_room(mtsrc_ctx *src) {
     memmove(src->q_base, src->q_rd, static_cast<size_t>(src->q_fill));
@@ -21,8 +24,9 @@ void deliver(mtsrc_ctx *src, int32_t bytes, mtsrc_frame *frame) {
     src->q_fill -= bytes;
 }
 
-// Returns 0 with want bytes held, else what ended the filling.
+// Returns 0 with want bytes held, else what ended the filling; -6 when the steps add nothing.
 int32_t fill_to(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill &fill) {
+    int32_t empty_steps = 0;
     while (src->q_fill < want) {
         if (src->q_room <= fill.room) {
             make_room(src);
@@ -30,9 +34,14 @@ int32_t fill_to(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill
                 return -4;
             }
         }
+        const int32_t held = src->q_fill;
         const int32_t code = fill.step(src, frame_buf, fill.work);
         if (code != 0) {
             return code;
+        }
+        empty_steps = src->q_fill > held ? 0 : empty_steps + 1;
+        if (empty_steps > kMaxEmptySteps) {
+            return -6;
         }
     }
     return 0;

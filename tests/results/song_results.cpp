@@ -1,5 +1,5 @@
 // song_results SONGS OUT [REFERENCE]
-// Analyses every WAV file in the directory SONGS in every mode and writes each result to OUT, all
+// Analyses every file in the directory SONGS in every mode and writes each result to OUT, all
 // digits of it. With REFERENCE, the file of another run or of another processor's build, the two
 // must be equal. Exit status: 0; 1 different, or a song without a result; 2 wrong usage.
 #include <algorithm>
@@ -94,7 +94,7 @@ int main(int argc, char **argv) {
     std::vector<std::filesystem::path> songs;
     std::error_code error;
     for (const auto &each : std::filesystem::directory_iterator(argv[1], error)) {
-        if (each.path().extension() == ".wav") songs.push_back(each.path());
+        if (each.is_regular_file()) songs.push_back(each.path());
     }
     std::sort(songs.begin(), songs.end());
 

@@ -66,14 +66,17 @@ wexa_tags *make_tags(const script &what) {
 int32_t take(const std::string &name, int32_t otherwise) {
     auto found = w().answers.find(name);
     if (found == w().answers.end() || found->second.empty()) {
-        return otherwise;
+        return told(name, "result", otherwise);
     }
     const int32_t result = found->second.front();
     found->second.pop_front();
-    return result;
+    return told(name, "result", result);
 }
 
 call &note(const char *name, void *of, int32_t result) {
+    if (w().tamper) {
+        w().calls.clear();
+    }
     w().calls.emplace_back();
     call &made = w().calls.back();
     made.name = name;
@@ -153,7 +156,8 @@ int32_t get_frm(const char *name, const char *kind, void *handle, void *buf, int
     }
     const frame *now = next_frame(of);
     noted.result = take(name, now ? now->result : 1);
-    if (!now) {
+    if (!now) {  // an end that is hidden is an empty frame
+        *bytes = told(name, "bytes", 0);
         return noted.result;
     }
     const size_t index = of->place++;
@@ -173,8 +177,8 @@ int32_t get_frm(const char *name, const char *kind, void *handle, void *buf, int
     if (length > 0) {
         memcpy(buf, from, length);
     }
-    *bytes = now->read_bytes.value_or(static_cast<int32_t>(length));
-    *first = now->start < 0 ? static_cast<int64_t>(index) : now->start;
+    *bytes = told(name, "bytes", now->read_bytes.value_or(static_cast<int32_t>(length)));
+    *first = told(name, "first", now->start < 0 ? static_cast<int64_t>(index) : now->start);
     *second = 0;
     return 0;
 }
@@ -212,6 +216,7 @@ int32_t move(const char *name, const char *kind, void *handle, const int64_t *po
             *reached = start;
         }
     }
+    *reached = told(name, "reached", *reached);
     return 0;
 }
 
@@ -238,8 +243,9 @@ int32_t decode(const char *name, const char *kind, void *handle, const wexa_fram
     if (noted.result != 0) {
         return noted.result;
     }
-    status->produced = now->produced;
-    output->bytes = now->bytes.value_or(static_cast<int32_t>(now->pcm.size() * 2));
+    status->produced = told(name, "produced", now->produced);
+    output->bytes =
+        told(name, "bytes", now->bytes.value_or(static_cast<int32_t>(now->pcm.size() * 2)));
     if (!now->pcm.empty()) {
         memcpy(output->data, now->pcm.data(), now->pcm.size() * 2);
     }
@@ -284,6 +290,12 @@ void reset() {
     w().balance.clear();
     w().faults.clear();
     w().flac_flag = true;
+    w().tamper = nullptr;
+}
+
+void tamper(tampering with) {
+    guard held(w().lock);
+    w().tamper = with;
 }
 
 void use(const script &what) {

@@ -64,6 +64,17 @@ struct call {
     std::vector<const void *> addresses = {};  // of the same records
 };
 
+// Stands between the script and the library: is given each value that a call is about to hand back,
+// with the names of the function and of the value, and answers what is handed back in its place.
+// Values: "result" of every function, first of a call's (for one that creates, 0 or why it gives
+// null); "bytes" and "first" of reads; "reached" of seeks; "produced" and "bytes" of decodings;
+// "rate", "channels", "bits", "codec", "duration", "count", "kind" and "length" of what describes
+// the file. Runs under the lock.
+using tampering = int64_t (*)(const std::string &function, const std::string &value, int64_t truth);
+
+// From now on until the next reset; of the calls, only the last is kept meanwhile.
+void tamper(tampering with);
+
 // Forgets scripts, calls and answers. To be called before each case, with no object alive.
 void reset();
 

@@ -5,17 +5,18 @@
 #include "tests/support/scripted_objects.h"
 
 using scripted::script;
+using scripted::told;
 
 extern "C" {
 
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t *word) {
     return scripted::create("xwavd_create", "xwavd", io, word, info,
-                            [](const script &what, xwav_info *to) {
-                                to->codec = what.codec.value_or(kWexaPcm);
-                                to->sample_rate = what.sample_rate;
-                                to->bits = what.bits;
-                                to->channels = what.channels;
-                                to->duration = what.duration;
+                            [](const script &what, xwav_info *to, const char *name) {
+                                to->codec = told(name, "codec", what.codec.value_or(kWexaPcm));
+                                to->sample_rate = told(name, "rate", what.sample_rate);
+                                to->bits = told(name, "bits", what.bits);
+                                to->channels = told(name, "channels", what.channels);
+                                to->duration = told(name, "duration", what.duration);
                             });
 }
 int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
@@ -93,50 +94,53 @@ SCRIPTED_STREAM(ogg)
 
 void *xaacfd_create(const mtsrc_io *io, int64_t *word, xaac_info *info, void *) {
     return scripted::create("xaacfd_create", "xaacfd", io, word, info,
-                            [](const script &what, xaac_info *to) {
-                                to->sample_rate = what.sample_rate;
-                                to->channels = what.channels;
-                                to->duration = what.duration;
+                            [](const script &what, xaac_info *to, const char *name) {
+                                to->sample_rate = told(name, "rate", what.sample_rate);
+                                to->channels = told(name, "channels", what.channels);
+                                to->duration = told(name, "duration", what.duration);
                                 to->tags = scripted::make_tags(what);
                             });
 }
 int32_t xaacd_info(void *decoder, const wexa_frame *frame, xaac_stream_info *info) {
     const wexa_frame handed = *frame;
-    const int32_t result = scripted::stream_info("xaacd_info", "xaacd", decoder, info,
-                                                 [](const script &what, xaac_stream_info *to) {
-                                                     to->word_0 = 1;
-                                                     to->sample_rate = what.sample_rate;
-                                                 });
+    const int32_t result =
+        scripted::stream_info("xaacd_info", "xaacd", decoder, info,
+                              [](const script &what, xaac_stream_info *to, const char *name) {
+                                  to->word_0 = 1;
+                                  to->sample_rate = told(name, "rate", what.sample_rate);
+                              });
     scripted::guard held(scripted::w().lock);
     scripted::hand(scripted::w().calls.back(), &handed);
     return result;
 }
 void *xflacfd_create(const mtsrc_io *io, int64_t *word, xflac_info *info, void *) {
     return scripted::create("xflacfd_create", "xflacfd", io, word, info,
-                            [](const script &what, xflac_info *to) {
-                                to->sample_rate = what.sample_rate;
-                                to->duration = what.duration;
+                            [](const script &what, xflac_info *to, const char *name) {
+                                to->sample_rate = told(name, "rate", what.sample_rate);
+                                to->duration = told(name, "duration", what.duration);
                                 to->tags = scripted::make_tags(what);
                             });
 }
 void *xmp123fd_create(const mtsrc_io *io, int64_t *word, xmp123_info *info, void *) {
     return scripted::create("xmp123fd_create", "xmp123fd", io, word, info,
-                            [](const script &what, xmp123_info *to) {
-                                to->sample_rate = what.sample_rate;
-                                to->channels = what.channels;
-                                to->duration = what.duration;
+                            [](const script &what, xmp123_info *to, const char *name) {
+                                to->sample_rate = told(name, "rate", what.sample_rate);
+                                to->channels = told(name, "channels", what.channels);
+                                to->duration = told(name, "duration", what.duration);
                                 to->tags = scripted::make_tags(what);
                             });
 }
 
 void *xmp4fd_create(const mtsrc_io *io, int32_t *word, xmp4_info *info, void *) {
     return scripted::create(
-        "xmp4fd_create", "xmp4fd", io, word, info, [](const script &what, xmp4_info *to) {
-            to->track_count = what.kind_count.value_or(static_cast<int32_t>(what.kinds.size()));
+        "xmp4fd_create", "xmp4fd", io, word, info,
+        [](const script &what, xmp4_info *to, const char *name) {
+            to->track_count = told(
+                name, "count", what.kind_count.value_or(static_cast<int32_t>(what.kinds.size())));
             for (size_t i = 0; i < what.kinds.size() && i < kMp4Tracks; ++i) {
-                to->kind[i] = what.kinds[i];
+                to->kind[i] = told(name, "kind", what.kinds[i]);
             }
-            to->duration = what.duration;
+            to->duration = told(name, "duration", what.duration);
             to->tags = scripted::make_tags(what);
         });
 }
@@ -148,21 +152,24 @@ void *xmp4fds_open(void *demux, int32_t track, void *) {
 }
 int32_t xmp4fds_get_info_aud(void *stream, xmp4_track *track) {
     return scripted::stream_info("xmp4fds_get_info_aud", "xmp4fds", stream, track,
-                                 [](const script &what, xmp4_track *to) {
-                                     to->format_tag = what.codec.value_or(kWexaTagAac);
-                                     to->sample_rate = what.sample_rate;
-                                     to->channels = what.channels;
+                                 [](const script &what, xmp4_track *to, const char *name) {
+                                     to->format_tag =
+                                         told(name, "codec", what.codec.value_or(kWexaTagAac));
+                                     to->sample_rate = told(name, "rate", what.sample_rate);
+                                     to->channels = told(name, "channels", what.channels);
                                  });
 }
 
 void *xoggd_create(const mtsrc_io *io, int64_t *word, xogg_info *info, void *) {
     return scripted::create(
-        "xoggd_create", "xoggd", io, word, info, [](const script &what, xogg_info *to) {
-            to->stream_count = what.kind_count.value_or(static_cast<int32_t>(what.kinds.size()));
+        "xoggd_create", "xoggd", io, word, info,
+        [](const script &what, xogg_info *to, const char *name) {
+            to->stream_count = told(
+                name, "count", what.kind_count.value_or(static_cast<int32_t>(what.kinds.size())));
             for (size_t i = 0; i < what.kinds.size() && i < kOggStreams; ++i) {
-                to->kind[i] = what.kinds[i];
+                to->kind[i] = told(name, "kind", what.kinds[i]);
             }
-            to->duration = what.duration;
+            to->duration = told(name, "duration", what.duration);
             to->tags = scripted::make_tags(what);
         });
 }
@@ -174,9 +181,9 @@ void *xoggds_open(void *demux, int32_t index, void *) {
 }
 int32_t xoggds_get_info_aud(void *stream, xogg_stream *info) {
     return scripted::stream_info("xoggds_get_info_aud", "xoggds", stream, info,
-                                 [](const script &what, xogg_stream *to) {
-                                     to->codec = what.codec.value_or(323);
-                                     to->sample_rate = what.sample_rate;
+                                 [](const script &what, xogg_stream *to, const char *name) {
+                                     to->codec = told(name, "codec", what.codec.value_or(323));
+                                     to->sample_rate = told(name, "rate", what.sample_rate);
                                  });
 }
 int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
@@ -189,12 +196,12 @@ int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
         return noted.result = noted.result ? noted.result : -1;
     }
     const std::vector<uint8_t> &setup = of->what->setup;
-    const int32_t reported = of->what->setup_length.value_or(static_cast<int32_t>(setup.size()));
-    if (!buf) {
-        *length = reported;
-    } else if (!setup.empty() && reported > 0) {
-        memcpy(buf, setup.data(), std::min(setup.size(), static_cast<size_t>(reported)));
+    int32_t reported = of->what->setup_length.value_or(static_cast<int32_t>(setup.size()));
+    if (buf) {  // *length says how much it holds
+        reported = std::clamp(*length, 0, static_cast<int32_t>(setup.size()));
+        memcpy(buf, setup.data(), static_cast<size_t>(reported));
     }
+    *length = told("xoggds_get_format", "length", reported);
     return 0;
 }
 }

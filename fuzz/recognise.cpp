@@ -1,0 +1,67 @@
+// Recognition of a file's format.
+//
+// Input: a byte that says whether zeros stand in the middle (so that the scan's limits, 32 KiB away,
+// come into a short input's reach) or which call of the file fails; then the file.
+#include "fuzz/fuzz.h"
+#include "fuzz/memory_io.h"
+#include "media_source/mtsrc.h"
+
+namespace {
+
+constexpr uint8_t kPlain = 0xE0;  // below: nothing special, as nearly always
+constexpr uint8_t kGaps = 0xF0;   // below: a gap
+constexpr int64_t kScanLimit = 32'764;
+constexpr int64_t kStart = 3;     // the probes begin where the file stands, which need not be 0
+
+// Callbacks that one recognition may take: a scan restarts at each tag, which has 10 bytes.
+int64_t most_calls(size_t bytes) {
+    return 64 + static_cast<int64_t>(bytes);
+}
+
+bool is_type(int32_t type) {
+    switch (type) {
+        case kTypeMp4:
+        case kTypeAsf:
+        case kTypeOgg:
+        case kTypeWav:
+        case kTypeAac:
+        case kTypeMpegLayer1:
+        case kTypeMpegLayer2:
+        case kTypeMpegLayer3:
+        case kTypeFlac:
+        case kTypeUnknown:
+            return true;
+        default:
+            return false;
+    }
+}
+
+}  // namespace
+
+int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
+    fuzz::input in = {data, size};
+    const uint8_t control = in.take<uint8_t>();
+    fuzz::memory_file *of = fuzz::set_memory_file(in.at, in.left);
+    const mtsrc_io io = fuzz::memory_io();
+    mtsrc_file *file = io.open(&io, 0);
+    const int64_t start = in.left > 64 && (control & 1) != 0 ? kStart : 0;
+    io.seek(file, &start);
+    if (control >= kPlain && control < kGaps) {
+        of->gap_at = of->bytes / 2;
+        of->gap = kScanLimit - 8 * (control - kPlain);
+    } else if (control >= kGaps) {
+        of->fail_at = of->calls + control - kGaps + 1;
+    }
+    int32_t type = 0;
+    const int32_t code = mtsrc_get_file_type(&io, file, &type);
+    fuzz::must(of->calls < most_calls(in.left), "recognition ends");
+    if (of->fail_at == 0) {
+        const bool enough = of->bytes + of->gap - start >= 16;
+        fuzz::must(code == (enough ? 0 : -6), "16 bytes are recognised, fewer are not read");
+        int64_t at = -1;
+        fuzz::must(io.tell(file, &at) == 0 && at == start, "the offset is where it was");
+    }
+    fuzz::must(code == 0 ? is_type(type) : code == -6, "the answer is a type or a read failure");
+    io.close(file);
+    return 0;
+}

@@ -1,0 +1,3 @@
+# Every answer of the codec library made wrong at every call. The scripted codec library's symbols
+# come before libwexaaudio.so's.
+tavo_test(trial_codec_faults ${CMAKE_CURRENT_LIST_DIR}/codec_faults.cpp LIBS scripted_codec song trial)
