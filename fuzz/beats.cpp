@@ -4,11 +4,12 @@
 // Guaranteed by the callers: a context as __beat_init makes it, frames of 512 samples every 256 at
 // 11025 Hz, a tempo of 30 to 200, samples of 16 bits; an envelope may hold anything but infinities
 // (silence makes it of values that are no numbers).
+#include "beat/beats.h"
+
 #include <algorithm>
 #include <cmath>
 #include <vector>
 
-#include "beat/beats.h"
 #include "beat/candidates.h"
 #include "beat/click_track.h"
 #include "beat/onset_envelope.h"
@@ -45,8 +46,9 @@ void start_frames(analysis *run, int64_t frames) {
     TAVO_BEAT_CTX *beat = &run->beat;
     fuzz::must(beat_ctx_ready(beat), "a context is made");
     beat->frame_count = frames;
-    for (void *shorter : {static_cast<void *>(beat->frame_times), static_cast<void *>(beat->onset_env),
-                          static_cast<void *>(beat->threshold)}) {
+    for (void *shorter :
+         {static_cast<void *>(beat->frame_times), static_cast<void *>(beat->onset_env),
+          static_cast<void *>(beat->threshold)}) {
         free(shorter);
     }
     beat->frame_times = zeroed_items<float>(frames);
@@ -76,8 +78,7 @@ void place_beats(fuzz::input *in) {
     for (int32_t &place : places) place = in->take<uint16_t>();
     std::vector<double> part(std::max<size_t>(1, in->left / 2));
     in->take_values(part.data(), part.size());
-    const int64_t frames =
-        1 + std::min(static_cast<int64_t>(part.size()) * repeats, kMostFrames);
+    const int64_t frames = 1 + std::min(static_cast<int64_t>(part.size()) * repeats, kMostFrames);
 
     start_frames(&run, frames);
     for (int64_t k = 0; k + 1 < frames; ++k) {
@@ -139,7 +140,8 @@ void whole_analysis(fuzz::input *in) {
     start_analysis(&run, &signal);
     fnamedec = "";
     const int32_t count = getBeatPosition(&run.ctx);
-    fuzz::must(count == run.onset.beat_count && run.ctx.state == kStateFinished, "it runs to its end");
+    fuzz::must(count == run.onset.beat_count && run.ctx.state == kStateFinished,
+               "it runs to its end");
     fuzz::must(run.onset.bpm >= 30 && run.onset.bpm <= 200, "a tempo is 30 to 200");
     check_beats(run.onset.beat_times, count, static_cast<int64_t>(signal.size()) / kHopSize);
     std::vector<float> track(signal.size());

@@ -45,9 +45,7 @@ void interpolate(fuzz::input *in, const int16_t *pcm, int32_t count) {
     const int64_t most = (static_cast<int64_t>(count) * target / source + 64) * channels;
     auto *out = static_cast<int16_t *>(calloc(static_cast<size_t>(most), sizeof(int16_t)));
     fuzz::must(dorn_resampler_prepare(state, source, target, channels) == 0, "rates are prepared");
-    const int32_t written = most > kMostOutput
-                                ? 0
-                                : dorn_resampler_convert(state, pcm, count, out);
+    const int32_t written = most > kMostOutput ? 0 : dorn_resampler_convert(state, pcm, count, out);
     fuzz::must(written >= 0 && written <= most && written % channels == 0,
                "a conversion writes whole frames");
     free(out);

@@ -53,8 +53,8 @@ std::vector<int32_t> take_positions(fuzz::input *in, int32_t count, size_t room,
 void select_region(fuzz::input *in) {
     const int32_t nv = in->take_from(0, kValleys);
     const int32_t nseg = in->take_from(0, kSegments);
-    const int32_t length = (in->take<uint8_t>() & 7) != 0 ? in->take<uint8_t>()
-                                                          : in->take_from(0, INT32_MAX / 2);
+    const int32_t length =
+        (in->take<uint8_t>() & 7) != 0 ? in->take<uint8_t>() : in->take_from(0, INT32_MAX / 2);
     const int32_t n = in->take_from(1, kMostPoints);
     const int32_t chosen = in->take_from(-1, n);
     const auto valleys = take_positions(in, nv, kValleys, n);
@@ -63,9 +63,8 @@ void select_region(fuzz::input *in) {
     const auto deviation = in->take<float>();
     std::vector<float> curve(static_cast<size_t>(n));
     in->take_values(curve.data(), curve.size());
-    const uint32_t start =
-        tavo_select_highlight_region(curve.data(), n, length, chosen, nv, valleys.data(),
-                                     pairs.data(), nseg, mean, deviation);
+    const uint32_t start = tavo_select_highlight_region(
+        curve.data(), n, length, chosen, nv, valleys.data(), pairs.data(), nseg, mean, deviation);
     fuzz::must(start < static_cast<uint32_t>(n), "a region starts in the song");
     fuzz::must(start == 0 || static_cast<int64_t>(start) + length <= n, "a region fits the song");
 }

@@ -2,8 +2,8 @@
 //
 // Input: mode, highlight length, beat limit, when to stop, how many bytes to append; then the file.
 // Bytes made up behind the input let a short one be a song of minutes.
-#include <sys/mman.h>
 #include <semaphore.h>
+#include <sys/mman.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -87,7 +87,8 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     if (!stop) {
         sem_wait(&called);
         fuzz::must(last.status == 0 || last.status == -1, "a result or a failure");
-        fuzz::must(last.status == 0 || (mode != 0 && last.beat_count == 0), "a failure has no beats");
+        fuzz::must(last.status == 0 || (mode != 0 && last.beat_count == 0),
+                   "a failure has no beats");
     }
     const int64_t duration_ms = tavo->duration / kUnitsPerMs;
     fuzz::must(last.hl_pos >= 0 && last.hl_pos <= duration_ms, "a highlight starts in the song");

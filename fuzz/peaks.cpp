@@ -2,10 +2,11 @@
 //
 // Input: distances and counts, then samples of any value. Guaranteed by the callers: lengths of the
 // arrays given, a distance that is not negative, room for the output as promised.
+#include "dsp/peaks.h"
+
 #include <algorithm>
 #include <vector>
 
-#include "dsp/peaks.h"
 #include "fuzz/fuzz.h"
 
 namespace {
@@ -45,8 +46,8 @@ void check_survivors(const std::vector<record<Sample>> &peaks, const std::vector
         bool explained = !all;
         for (int64_t k = 0; k < count && !explained; ++k) {
             const auto at = static_cast<int64_t>(out[k]);
-            explained =
-                at == peak.index || (near(at, peak.index) && (k < pinned || value(k) >= peak.value));
+            explained = at == peak.index ||
+                        (near(at, peak.index) && (k < pinned || value(k) >= peak.value));
         }
         fuzz::must(explained, "an absent peak is suppressed");
     }
@@ -60,8 +61,8 @@ void sorted_peaks(fuzz::input *in) {
     const auto peaks = all_peaks(x);
     const size_t room = max_count == 0 ? x.size() / 2 : std::min<size_t>(max_count, x.size() / 2);
     std::vector<uint32_t> out(room);
-    const int32_t count = findsortedNPeaks(x.data(), static_cast<int64_t>(x.size()), min_dist,
-                                           max_count, out.data());
+    const int32_t count =
+        findsortedNPeaks(x.data(), static_cast<int64_t>(x.size()), min_dist, max_count, out.data());
     fuzz::must(count >= 0 && static_cast<size_t>(count) <= room, "peaks fit their room");
     const bool all = max_count == 0 || static_cast<uint32_t>(count) < max_count;
     check_survivors(peaks, x, out.data(), 0, count, min_dist, all);
@@ -73,8 +74,7 @@ void spaced_peaks(fuzz::input *in) {
     in->take_values(x.data(), x.size());
     const auto peaks = all_peaks(x);
     std::vector<int32_t> out(x.size() / 2);
-    const int32_t count =
-        findPeaks(x.data(), static_cast<int64_t>(x.size()), min_dist, out.data());
+    const int32_t count = findPeaks(x.data(), static_cast<int64_t>(x.size()), min_dist, out.data());
     if (min_dist != 0) {
         check_survivors(peaks, x, out.data(), 0, count, static_cast<int64_t>(min_dist) - 1, true);
         return;

@@ -1,7 +1,7 @@
 // Sorting, statistics, the mel scale and the matrix product.
 //
-// Input: values of any kind, infinities and what is no number among them. Guaranteed by the callers:
-// arrays of the lengths given, of 1 to 2^31 - 1 values for partition.
+// Input: values of any kind, infinities and what is no number among them. Guaranteed by the
+// callers: arrays of the lengths given, of 1 to 2^31 - 1 values for partition.
 #include <algorithm>
 #include <cmath>
 #include <vector>
@@ -109,9 +109,9 @@ void multiply(fuzz::input *in) {
     const auto a_rows = rows_of(&a, rows, inner);
     const auto b_rows = rows_of(&b, inner, columns);
     const auto d_rows = rows_of(&d, rows, columns);
-    fuzz::must(MultiplyMtxs(rows, columns, inner, a_rows.data(), b_rows.data(), d_rows.data()) ==
-                   rows,
-               "a product has its rows");
+    fuzz::must(
+        MultiplyMtxs(rows, columns, inner, a_rows.data(), b_rows.data(), d_rows.data()) == rows,
+        "a product has its rows");
     for (int32_t i = 0; i < rows; ++i) {
         for (int32_t j = 0; j < columns; ++j) {
             double sum = 0.0;

@@ -5,7 +5,8 @@
 namespace {
 
 constexpr int32_t kFrameBytes = 16'384;
-constexpr int32_t kVorbisChannels = 1;  // the decoder is asked for one
+constexpr int32_t kMaxSetupBytes = 1 << 24;  // code books take some kilobytes
+constexpr int32_t kVorbisChannels = 1;       // the decoder is asked for one
 
 int32_t read_frame(mtsrc_ctx *src, wexa_frame *frame, int64_t *first) {
     int64_t second = 0;
@@ -33,7 +34,8 @@ constexpr elementary_ops kOgg = {
 // On success the caller frees setup->data.
 int32_t fetch_setup(mtsrc_ctx *src, wexa_frame *setup) {
     int32_t length = 0;
-    if (xoggds_get_format(src->dstream, nullptr, &length) != 0 || length < 0) {
+    if (xoggds_get_format(src->dstream, nullptr, &length) != 0 || length < 0 ||
+        length > kMaxSetupBytes) {
         return -7;
     }
     const int32_t capacity = length;

@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# scripts/setup.sh [build|tests|package]...
+# scripts/setup.sh [build|tests|fuzz|measure|package]...
 # Installs the Debian packages that are missing, for building and testing by default. Says nothing
 # when none is.
 set -euo pipefail
@@ -16,16 +16,20 @@ tests=(
   ffmpeg flac lame vorbis-tools
   doxygen groff-base
 )
+fuzz=(clang libclang-rt-14-dev)
+measure=(clang libclang-rt-14-dev gcovr valgrind)
 package=(dpkg-dev file debootstrap) # scripts/test-package.sh
 
 wanted=()
-for group in "${@:-build tests}"; do
+for group in "${@:-build tests fuzz}"; do
   for name in $group; do
     case $name in
       build) wanted+=("${build[@]}") ;;
       tests) wanted+=("${tests[@]}") ;;
+      fuzz) wanted+=("${fuzz[@]}") ;;
+      measure) wanted+=("${measure[@]}") ;;
       package) wanted+=("${package[@]}") ;;
-      *) echo "setup: no group '$name'; groups: build, tests, package" >&2; exit 2 ;;
+      *) echo "setup: no group '$name'; groups: build, tests, fuzz, measure, package" >&2; exit 2 ;;
     esac
   done
 done
