@@ -24,10 +24,10 @@ bash scripts/setup.sh build tests fuzz measure
 mkdir -p build/soak docs/figures
 
 trial() { # trial PRESET PROGRAM: all cases of a trial program in its full tier
-  cmake --preset "$1" >/dev/null
-  cmake --build --preset "$1" --target "$2" make_song wexaaudio tavo log >/dev/null
-  ctest --preset "$1" -R '^(codec_fixtures|fault_songs)$' >/dev/null
-  TAVO_TRIALS=full "build/$1/bin/$2"
+  cmake --preset "$1" >/dev/null &&
+    cmake --build --preset "$1" --target "$2" make_song wexaaudio tavo log &&
+    ctest --preset "$1" -R '^(codec_fixtures|fault_songs)$' &&
+    TAVO_TRIALS=full "build/$1/bin/$2"
 }
 
 measure() { # measure STEP

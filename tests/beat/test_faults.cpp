@@ -3,6 +3,7 @@
 
 #include <atomic>
 
+#include "beat/candidates.h"
 #include "tests/beat/beat_fixture.h"
 
 extern "C" {
@@ -50,8 +51,9 @@ outcome analyse(const std::vector<double> &song, int stop_at = -1) {
     stop_flag = &of.ctx.quit;
     stop_start = stop_at;
     watching = true;
-    getBeatPosition(&of.ctx);
+    const int32_t count = getBeatPosition(&of.ctx);
     watching = false;
+    EXPECT_EQ(count, of.ctx.onset->beat_count);
     // What is still held may only be the beats.
     const int kept = of.ctx.onset->beat_times != nullptr ? 1 : 0;
     return {of.beats(), of.ctx.onset->bpm, of.ctx.state, held - kept};
@@ -120,6 +122,13 @@ TEST(BeatFaults, EveryAllocationRefused) {
         }
     }
     EXPECT_GT(without_beats, 500);
+}
+
+TEST(BeatFaults, RoomForEveryPeakAndRise) {
+    TAVO_BEAT_CTX beat = {};
+    beat.frame_count = 100;
+    beat.rise_count = 3;
+    EXPECT_EQ(candidate_room(&beat), 50 + 3 + 50);  // half of the frames, the rises, those added
 }
 
 // The body of a worker whose thread cannot be started runs on the calling thread.

@@ -48,6 +48,12 @@ TEST(Region, TheValleyBefore) {
     EXPECT_EQ(region(kLoud, 6, 9, {0, 10}, {}), 1u);
 }
 
+// The drop at 46 comes too early; at 48 and 49 it is not followed by another, but nothing is lower.
+TEST(Region, TheFirstSevenPointsAreNoEnd) {
+    const SONG early = {120, 0.25f, {{46, 0.25f}, {48, 0.25f}, {49, 0.25f}}};
+    EXPECT_EQ(region(early, 40, 15, {}, {}), 33u);
+}
+
 TEST(Region, SegmentBoundaryOrValley) {
     // Ideal start 35; the walk through the boundaries stops where the distance no longer falls.
     EXPECT_EQ(region(kLoud, 40, 15, {38, 50}, {32, 60}), 38u);  // equally near: the valley

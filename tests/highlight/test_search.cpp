@@ -88,6 +88,22 @@ TEST(Search, TheEndIsNotScored) {
     }
 }
 
+TEST(Search, TheEndOfAShortSong) {
+    for (int rise : {50, 51}) {
+        const auto song = runs({{rise + 1, 0.25f}, {5, 1.0f}, {54 - rise, 0.25f}});
+        ASSERT_EQ(song.size(), 60u);
+        EXPECT_EQ(search(song, 89), rise == 50 ? 100000u : 104000u);
+    }
+}
+
+// Thirty loud passages, the last the loudest: it is the last one that is looked at.
+TEST(Search, ThirtyPassages) {
+    std::vector<RUN> passages;
+    for (int k = 0; k < 29; ++k) passages.insert(passages.end(), {{4, 0.25f}, {6, 0.75f}});
+    passages.insert(passages.end(), {{4, 0.25f}, {6, 1.0f}, {30, 0.25f}});
+    EXPECT_EQ(search(runs(passages), 660), 2000u * 293u);
+}
+
 // Bursts of two points are too short to be scored: the first edge that no valley follows closely is
 // taken, at the point after it. Dips below 0.336 are low points; the valley is the last of them.
 TEST(Search, WithoutAScoreAValleyNearTheEdgeRulesItOut) {
@@ -97,6 +113,9 @@ TEST(Search, WithoutAScoreAValleyNearTheEdgeRulesItOut) {
     near.insert(near.end(), end.begin(), end.end());
     ASSERT_EQ(runs(near).size(), 60u);
     EXPECT_EQ(search(runs(near), 120), 60000u);  // the valley at 23 is 3 after 20
+    auto two_valleys = runs(near);
+    two_valleys[52] = 0.1f;
+    EXPECT_EQ(search(two_valleys, 120), 60000u);
 
     std::vector<RUN> far = {{20, 0.5f}, {1, 1.0f}, {1, 0.9f}, {1, 0.5f},
                             {1, 0.3f},  {1, 0.1f}, {1, 0.4f}};
@@ -147,6 +166,7 @@ TEST(Search, ARequestedLengthMovesTheStart) {
         {61, 26000},                              // the same number of points
         {74, 26000},                              // ideal 12
         {102, 18000},                             // 9 + 51 reaches the end: the first segment
+        {104, 18000},                             // and 9 + 52 passes it
     };
     for (const auto &c : cases) EXPECT_EQ(search(song, 120, c.hl_param), c.ms) << c.hl_param;
 }

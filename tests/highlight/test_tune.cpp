@@ -64,6 +64,19 @@ TEST(Tune, OnlyRisesAboveTheLeastCount) {
     EXPECT_EQ(_tune_HL_simple(pcm.data(), 8000, 3000, kDuration), 3000u);
 }
 
+// Five steps of square c: the rise at frame 10 counts the fifth frame, still c, not the sixth of
+// 2 c / 3, and with it reaches the least that counts; each alone would be 0.8 c or 0.73 c.
+TEST(Tune, ARiseIsMeasuredOverFiveFrames) {
+    const auto pcm = steps(8000, 0, silence_then({0.039, 0.039, 0.039, 0.039, 0.039, 0.0}));
+    EXPECT_EQ(_tune_HL_simple(pcm.data(), 8000, 3000, kDuration), 5200u);
+}
+
+// Also the first frame may be the one before the rise; 3 to 4 is the first of the level steps.
+TEST(Tune, ARiseAtTheFirstFrame) {
+    const auto pcm = steps(8000, 0, {0.0, 0.0, 0.0, 0.5});
+    EXPECT_EQ(_tune_HL_simple(pcm.data(), 8000, 3000, kDuration), 1200u);
+}
+
 // Two equal steps up, with a break between them long enough to give equal rises.
 TEST(Tune, TheFirstOfEqualRises) {
     const std::vector<double> pulse = {0, 0, 0, 0, 0, 0, 0.5, 0.5, 0.5, 0.5, 0.5, 0, 0, 0, 0, 0, 0};

@@ -318,6 +318,13 @@ TEST_F(Elementary, AacRateOfTheNextFrame) {
 }
 
 TEST_F(Elementary, AacRateThatCannotBeHad) {
+    for (const int32_t bytes : {24576, 24577}) {
+        scripted::script what = frames_of({group(2)});
+        what.frames[0].read_bytes = bytes;
+        ASSERT_EQ(open_row(source_row_of("aac"), what), 0);
+        EXPECT_EQ(aac_get_hz(src->demux, src->decoder), bytes == 24576 ? what.sample_rate : -1);
+        close_source();
+    }
     ASSERT_EQ(open_row(source_row_of("aac"), frames_of({group(2), group(4)})), 0);
     scripted::answer("xaacd_info", {-1});
     EXPECT_EQ(aac_get_hz(src->demux, src->decoder), -1);

@@ -109,6 +109,7 @@ TEST_F(FileIo, AHandleWithoutADescriptorFails) {
     EXPECT_EQ(mtsrc_file_read(&none, &byte, 1), -1);
     EXPECT_EQ(mtsrc_file_tell(&none, &value), -1);
     EXPECT_EQ(mtsrc_file_size(&none, &value), -1);
+    EXPECT_EQ(mtsrc_file_tell(nullptr, &value), -1);
     EXPECT_EQ(value, 77);
     auto *cell = static_cast<mtsrc_file *>(malloc(sizeof(mtsrc_file)));
     cell->fd = -1;

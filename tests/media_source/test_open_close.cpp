@@ -238,6 +238,11 @@ TEST_F(OpenClose, WithoutAHandleOrAProbeFile) {
                             mtsource_mp123_seek, mtsource_mp4a_seek, mtsource_ogg_seek}) {
         EXPECT_EQ(seek(nullptr, 0, &reached), -4);
     }
+    mtsrc_frame frame = {};
+    for (const auto read : {mtsource_wav_get_frm, mtsource_aac_get_frm, mtsource_flac_get_frm,
+                            mtsource_mp123_get_frm, mtsource_mp4a_get_frm, mtsource_ogg_get_frm}) {
+        EXPECT_EQ(read(nullptr, 0, &frame), -4);
+    }
     EXPECT_EQ(mtsource_mp4a_seek(&empty, 0, &reached), -4);  // no stream
     EXPECT_EQ(scripted::call_names(), names{});
 }

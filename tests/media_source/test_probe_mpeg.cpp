@@ -56,6 +56,33 @@ TEST(ProbeMpeg, TwoHeadersOneFrameLengthApart) {
     }
 }
 
+// Kilobits a second of each index from 1 on, as published; a frame of Layer I has 48 bytes for each
+// at 12 kHz, those of the others 144 or, in MPEG-2's Layer III, 72.
+TEST(ProbeMpeg, EveryBitrate) {
+    struct {
+        uint8_t second;  // byte of the header
+        size_t unit;     // bytes a frame of 1 kbit/s takes at 1 kHz
+        size_t khz;
+        std::vector<size_t> kilobits;
+    } const rows[] = {
+        {0xFB, 144, 48, {32, 40, 48, 56, 64, 80, 96, 112, 128, 160, 192, 224, 256, 320}},
+        {0xFD, 144, 48, {32, 48, 56, 64, 80, 96, 112, 128, 160, 192, 224, 256, 320, 384}},
+        {0xFF, 12, 48, {32, 64, 96, 128, 160, 192, 224, 256, 288, 320, 352, 384, 416, 448}},
+        {0xF3, 72, 24, {8, 16, 24, 32, 40, 48, 56, 64, 80, 96, 112, 128, 144, 160}},
+        {0xF5, 144, 24, {8, 16, 24, 32, 40, 48, 56, 64, 80, 96, 112, 128, 144, 160}},
+        {0xF7, 12, 24, {32, 48, 56, 64, 80, 96, 112, 128, 144, 160, 176, 192, 224, 256}},
+    };
+    for (const auto &row : rows) {
+        for (size_t index = 1; index <= 14; ++index) {
+            const byte_run header = {0xFF, row.second, static_cast<uint8_t>(index << 4 | 4)};
+            const size_t slots = row.unit * row.kilobits[index - 1] / row.khz;
+            const size_t length = row.unit == 12 ? 4 * slots : slots;
+            EXPECT_NE(probe(pair(header, length)), 2199) << int{row.second} << ", " << index;
+            EXPECT_EQ(probe(pair(header, length + 1)), 2199) << int{row.second} << ", " << index;
+        }
+    }
+}
+
 TEST(ProbeMpeg, WhatIsNoHeader) {
     struct {
         const char *name;

@@ -56,6 +56,7 @@ TEST_F(ten_seconds, last_bytes_come_with_the_end) {
     ASSERT_EQ(decode(), 159'001);
     EXPECT_EQ(decoded(159'001), slice(stream, 0, 159'001));
     EXPECT_EQ(ctx.seg[3].got, 39'001);
+    EXPECT_EQ(audio[3].wanted.size(), 5U);  // nothing is asked for behind the end
 }
 
 TEST_F(ten_seconds, other_audio_is_appended) {

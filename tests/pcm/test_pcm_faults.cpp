@@ -162,6 +162,15 @@ TEST(pcm_faults, from_the_highlight) {
     });
 }
 
+TEST(pcm_faults, comparison) {
+    TAVO_DECSEG seg = {};
+    int64_t off = 0;
+    failing_allocation = 1;
+    const int32_t code = _compare_decoded(&seg, nullptr, &off);
+    failing_allocation = 0;
+    EXPECT_EQ(code, -1);
+}
+
 TEST(pcm_faults, conversion) {
     const std::vector<int16_t> in(4000, 1000);
     const struct {

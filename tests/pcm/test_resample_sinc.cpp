@@ -180,6 +180,9 @@ TEST(resample_sinc, arithmetic_by_hand) {
 }
 
 TEST(resample_sinc, bad_arguments_and_phases) {
+    dorn_resampler_state lowest;
+    EXPECT_NE(dorn_resampler_prepare(&lowest, 2, 1, 1), -1);
+    EXPECT_EQ(dorn_resampler_prepare(&lowest, 2, 0, 1), -1);
     const std::vector<int16_t> in(100, 1);
     std::vector<int16_t> out(1000);
     const auto state = prepared(48000);
