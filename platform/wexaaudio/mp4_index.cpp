@@ -131,33 +131,47 @@ bool is_fragmented(io_file *file) {
     return false;
 }
 
-// False when the frame does not lie within the file, or out of memory.
-bool add_frame(mp4_index *index, const io_file *file, int64_t offset, int64_t bytes) {
-    return offset >= 0 && bytes >= 0 && bytes <= file->size && offset <= file->size - bytes &&
-           frame_index_add(&index->frames, {offset, -1, static_cast<int32_t>(bytes), 0});
+// The list of frames ends before the first one that does not.
+bool lies_within(const io_file *file, int64_t offset, int64_t bytes) {
+    return offset >= 0 && bytes >= 0 && bytes <= file->size && offset <= file->size - bytes;
 }
 
-void read_table(mp4_index *index, AVStream *stream, const io_file *file) {
+// False when out of memory, and only then.
+bool add_frame(mp4_index *index, int64_t offset, int64_t bytes) {
+    return frame_index_add(&index->frames, {offset, -1, static_cast<int32_t>(bytes), 0});
+}
+
+// False when out of memory.
+bool read_table(mp4_index *index, AVStream *stream, const io_file *file) {
     const int count = avformat_index_get_entries_count(stream);
     for (int i = 0; i < count; ++i) {
         const AVIndexEntry *entry = avformat_index_get_entry(stream, i);
-        if (!add_frame(index, file, entry->pos, entry->size)) {
-            return;
+        if (!lies_within(file, entry->pos, entry->size)) {
+            return true;
+        }
+        if (!add_frame(index, entry->pos, entry->size)) {
+            return false;
         }
     }
+    return true;
 }
 
-// Goes through the whole file, since each fragment's table comes before its frames.
-void read_fragments(mp4_index *index, av_file *f, const io_file *file) {
+// Goes through the whole file, since each fragment's table comes before its frames. False when out
+// of memory.
+bool read_fragments(mp4_index *index, av_file *f, const io_file *file) {
     AVPacket *packet = av_packet_alloc();
-    bool more = packet != nullptr;
-    while (more && av_read_frame(f->format, packet) == 0) {
-        if (packet->stream_index == index->track) {
-            more = add_frame(index, file, packet->pos, packet->size);
+    int result = packet != nullptr ? 0 : AVERROR(ENOMEM);
+    while (result == 0) {
+        result = av_read_frame(f->format, packet);
+        if (result == 0 && packet->stream_index == index->track) {
+            result = !lies_within(file, packet->pos, packet->size)  ? AVERROR_EOF
+                     : !add_frame(index, packet->pos, packet->size) ? AVERROR(ENOMEM)
+                                                                    : 0;
         }
         av_packet_unref(packet);
     }
     av_packet_free(&packet);
+    return result != AVERROR(ENOMEM);
 }
 
 void read_tracks(mp4_index *index, const AVFormatContext *format) {
@@ -204,17 +218,18 @@ bool mp4_index_read(mp4_index *index, io_file *file, wexa_tags *tags) {
     }
     tags_from_metadata(tags, f.format->metadata);
     read_tracks(index, f.format);
+    bool ok = true;
     if (index->track >= 0) {
         AVStream *stream = f.format->streams[index->track];
         index->format_tag = read_codec(index, stream->codecpar);
         if (index->format_tag != 0 && is_fragmented(file)) {
-            read_fragments(index, &f, file);
+            ok = read_fragments(index, &f, file);
         } else if (index->format_tag != 0) {
-            read_table(index, stream, file);
+            ok = read_table(index, stream, file);
         }
     }
     close_file(&f);
-    const bool ok = !file->failed;
+    ok = ok && !file->failed;
     if (!ok) {
         frame_index_free(&index->frames);
     }

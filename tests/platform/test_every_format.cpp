@@ -1,4 +1,5 @@
 // What every format's reader owes, on every file of the fixtures.
+#include <algorithm>
 #include <cstring>
 
 #include "media_source/wexaaudio.h"
@@ -45,6 +46,69 @@ TEST(TagRecord, HoldsTitleArtistAndAlbum) {
     expect(flac(fixture("no_table.flac")));
     expect(mp4(fixture("tagged.m4a")));
     expect(ogg(fixture("song.ogg")));
+}
+
+// A decoder that is handed a frame as it stands in the file, as a host without our reader would do.
+// The FLAC frame is the first of 4096 samples; the decoder takes what follows for padding.
+TEST(BareFrame, IsDecoded) {
+    const wexa_config stereo = {1, 2, 2, 0};
+    bytes pcm(1 << 20);
+    wexa_output output = {};
+    output.data = pcm.data();
+    wexa_status status = {};
+    wexa_frame frame = {};
+
+    bytes flac = codec_test::load(fixture("long_blocks.flac"));
+    const uint8_t sync[] = {0xFF, 0xF8};
+    const auto first = std::search(flac.begin() + 42, flac.end(), sync, sync + 2);
+    frame.data = &*first;
+    frame.bytes = 20'000;
+    void *decoder = xflacd_create(&stereo, nullptr);
+    ASSERT_NE(decoder, nullptr);
+    EXPECT_EQ(xflacd_decode(decoder, &frame, &output, &status), 0);
+    EXPECT_NE(status.produced, 0);
+    ASSERT_EQ(output.bytes, 4096 * 4);
+    const bytes wav = codec_test::load(fixture("song.wav"));
+    EXPECT_TRUE(std::equal(pcm.begin(), pcm.begin() + output.bytes, wav.begin() + 44));
+    xflacd_delete(decoder);
+
+    bytes mpeg = codec_test::load(fixture("cbr.mp3"));
+    frame.data = mpeg.data();
+    frame.bytes = 417;
+    decoder = xmp123d_create(&stereo, nullptr);
+    ASSERT_NE(decoder, nullptr);
+    EXPECT_EQ(xmp123d_decode(decoder, &frame, &output, &status), 0);
+    EXPECT_EQ(output.bytes, 1152 * 4);
+    xmp123d_delete(decoder);
+}
+
+TEST(Decoder, RefusesWhatItIsNotMadeFor) {
+    const wexa_config wrong[] = {{1, 2, 3, 0}, {1, 3, 2, 0}, {1, -1, 2, 0}};
+    const wexa_config right = {1, 1, 2, 0};
+    const struct {
+        void *(*create)(const wexa_config *, void *);
+        int32_t (*decode)(void *, const wexa_frame *, wexa_output *, wexa_status *);
+        void (*remove)(void *);
+    } decoders[] = {{xflacd_create, xflacd_decode, xflacd_delete},
+                    {xmp123d_create, xmp123d_decode, xmp123d_delete},
+                    {xvorbisd_create, xvorbisd_decode, xvorbisd_delete}};
+    for (const auto &each : decoders) {
+        EXPECT_EQ(each.create(nullptr, nullptr), nullptr);
+        for (const wexa_config &config : wrong) {
+            if (each.create == xvorbisd_create)
+                break;  // it takes any, and gives one channel or two
+            EXPECT_EQ(each.create(&config, nullptr), nullptr);
+        }
+        void *decoder = each.create(&right, nullptr);
+        ASSERT_NE(decoder, nullptr);
+        wexa_frame frame = {};
+        wexa_output output = {};
+        wexa_status status = {};
+        EXPECT_NE(each.decode(decoder, &frame, &output, &status), 0);  // no bytes
+        EXPECT_NE(each.decode(nullptr, &frame, &output, &status), 0);
+        each.remove(decoder);
+        each.remove(nullptr);
+    }
 }
 
 // Nothing of a format but its first bytes, or not even these.

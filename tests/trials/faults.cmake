@@ -8,13 +8,18 @@ add_test(NAME fault_songs
   COMMAND ${CMAKE_CURRENT_LIST_DIR}/make_fault_songs.sh ${make_song_program} ${fault_songs})
 set_tests_properties(fault_songs PROPERTIES FIXTURES_SETUP fault_songs TIMEOUT 300)
 
-add_executable(trial_faults faults.cpp fault_run.cpp fault_plan.cpp)
-set(fault_sample 12)  # of the places, in the quick tier
-if(TAVO_SANITIZE)
-  set(fault_sample 6)
+# How many places the quick tier tries, and in how many formats where one test goes through them.
+set(fault_sample 8)
+set(fault_formats 6)
+if(TAVO_SANITIZE STREQUAL "thread")
+  set(fault_sample 3)
+  set(fault_formats 2)
+elseif(TAVO_SANITIZE)
+  set(fault_sample 5)
 endif()
+add_executable(trial_faults faults.cpp fault_run.cpp fault_plan.cpp)
 target_compile_definitions(trial_faults PRIVATE FAULT_SONGS="${fault_songs}"
-  FAULT_SAMPLE=${fault_sample})
+  FAULT_SAMPLE=${fault_sample} FAULT_FORMATS=${fault_formats})
 target_link_libraries(trial_faults PRIVATE tavo_whole trial GTest::gtest_main)
 foreach(call malloc calloc realloc free av_malloc av_mallocz av_free av_freep
     av_packet_alloc av_packet_free av_new_packet av_frame_alloc av_frame_free
