@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -144,7 +145,29 @@ TEST(FaultsOfFiles, EveryCall) {
     in_all_formats("files", "read", {call::read}, false);
     in_all_formats("files", "lseek", {call::seek}, false);
     in_all_formats("files", "close", {call::close}, true);
+    in_all_formats("files", "click_track", {call::click_track}, true);
     EXPECT_EQ(open_descriptors(), descriptors);
+}
+
+// A path that stands for a descriptor, which every source duplicates. Duplicates share one offset:
+// of songs that are decoded in one part only one of them is read at a time.
+TEST(FaultsOfFiles, Duplicates) {
+    const int input = dup(STDIN_FILENO);
+    for (const bool forever : {false, true}) {
+        tally sum;
+        for (const std::string &format : formats()) {
+            const int file =
+                open((std::string(FAULT_SONGS) + "/brief." + format).c_str(), O_RDONLY);
+            ASSERT_EQ(dup2(file, STDIN_FILENO), STDIN_FILENO) << format;
+            close(file);
+            fault::at_every_place({"fd", TAVO_MODE_BEATS}, {call::dup, 0, forever}, false,
+                                  FAULT_SAMPLE, &sum);
+        }
+        EXPECT_GT(sum.refused, 0);
+        print("files", {{"call", "dup"}, {"series", series(false, forever)}}, sum);
+    }
+    dup2(input, STDIN_FILENO);
+    close(input);
 }
 
 // What a file gives comes in pieces of any length, or a signal interrupts: nothing may change.

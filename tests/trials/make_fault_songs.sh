@@ -1,7 +1,8 @@
 #!/bin/sh
 # make_fault_songs.sh MAKE_SONG DIR: songs whose analysis takes milliseconds, in every format, with
-# tags. The short ones are decoded in four parts; the long ones have a highlight that is not at their
-# start; the many have more frames than an index first has room for. Nothing is done when DIR is complete and newer than this script and MAKE_SONG.
+# tags. The brief ones are decoded in one part, the short ones in four; the long ones have a highlight
+# that is not at their start; the many have more frames than an index first has room for. Nothing is
+# done when DIR is complete and newer than this script and MAKE_SONG.
 set -eu
 make_song=$1
 out=$2
@@ -17,7 +18,7 @@ convert() { # convert IN OUT OPTIONS...
   ffmpeg -nostdin -v error -y -i "$in" -fflags +bitexact -flags:a +bitexact "$@" "$to"
 }
 
-for song in 'short 6 3' 'long 15 8' 'many 150 40'; do
+for song in 'brief 4.5 2' 'short 6 3' 'long 15 8' 'many 150 40'; do
   set -- $song
   # 11025 Hz goes through the block average, 8000 Hz through the interpolator.
   "$make_song" "$1.wav" --seconds "$2" --loud-at "$3" --channels 1 --rate 11025 >/dev/null
@@ -29,7 +30,7 @@ for song in 'short 6 3' 'long 15 8' 'many 150 40'; do
 done
 convert short.aac short.m4a -c copy -bsf:a aac_adtstoasc -metadata title='A Title' \
   -movflags +delay_moov+default_base_moof -frag_duration 700000
-for song in long many; do
+for song in brief long many; do
   convert $song.aac $song.m4a -c copy -bsf:a aac_adtstoasc -metadata title='A Title'
 done
 rm low.wav
