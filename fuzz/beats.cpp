@@ -151,7 +151,7 @@ void whole_analysis(fuzz::input *in) {
 
 // Whatever beats there are, blips stay in the track.
 void lay_blips(fuzz::input *in) {
-    const int32_t rate = in->take_from(-1, 192'000);
+    const int32_t rate = in->take_from(1, 192'000);
     std::vector<float> track(in->take<uint16_t>() % 30'000);
     std::vector<float> beats(std::min<size_t>(in->left / 4, 64));
     in->take_values(beats.data(), beats.size());
