@@ -198,8 +198,9 @@ TEST_P(CodecFaults, AreSurvived) {
     scripted::reset();  // the last job's tag records
     unlink(path.c_str());
     const double mib = trial::peak::mib();
-    if (!CODEC_FAULTS_SANITIZED)
-        EXPECT_LT(mib, kMostMib);  // sanitizers touch what is only reserved
+    if (!CODEC_FAULTS_SANITIZED) {  // sanitizers touch what is only reserved
+        EXPECT_LT(mib, kMostMib);
+    }
     std::string format = GetParam();
     std::replace(format.begin(), format.end(), ' ', '_');
     for (const auto &[function, count] : counts) {
