@@ -116,7 +116,7 @@ done
 for file in *.*; do
   head -c 1000 "$file" >head
   seed recognise "$file" '\0' head
-  seed recognise "gap_$file" '\xe0' head
+  seed recognise_far "$file" '\0' head
 done
 mode=0
 for file in *.mp3 *.flac *.aac *.m4a *.mp4 *.ogg mono8.wav; do
