@@ -2,8 +2,8 @@
 # scripts/coverage.sh
 # Builds with counters, runs the tests and prints how many lines and branches of the library and of
 # the codec library's stand-in they executed. What they did not is listed in
-# docs/figures/uncovered.txt. Fails when too little is covered, or when lines that are not have no
-# reason in docs/figures/explained.txt.
+# docs/figures/uncovered.txt. Fails when too little is covered, or when lines or branches that are not
+# have no reason in docs/figures/explained.txt.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 build=${TAVO_COVERAGE_BUILD:-build/coverage}

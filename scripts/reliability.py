@@ -10,7 +10,7 @@ import pathlib
 import sys
 
 # A set's heading, the files its rows come from, and what they mean. Columns of ZERO must be 0 in
-# every row; LEAST are sums over a column that must be reached.
+# every row.
 SETS = {
     "allocations": ("Allocations that fail", ["faults"], """
 Each allocation of opening, job and release fails, once or from there on for ever, at every place in
@@ -38,7 +38,8 @@ libFuzzer with address, undefined-behaviour and leak sanitizers. `aim` is what a
     "matrix": ("Compilers, optimisation and sanitizers", ["matrix"], """
 The test suite and the results (ms and BPM, compared to the last digit) of every build."""),
     "coverage": ("Coverage", ["coverage"], """
-Lines and branches that the tests execute."""),
+Lines and branches that the tests execute. Every place that is not executed or does not take all of
+its branches is named in `docs/figures/uncovered.txt`; why, stands below by the file and function."""),
     "mutation": ("Mutation", ["mutation"], """
 One comparison, operator or constant changed at a time, in `dsp`, `highlight`, `beat`, `pcm` and
 `media_source`, and the tests run on it."""),
@@ -97,11 +98,15 @@ def origin(figures, sources):
 
 
 def notes(path):
+    """The subjects of a file of "subject, tab, reason", those of one reason together."""
     if not path.is_file():
         fail(f"{path} is missing")
-    lines = [line.split("\t", 1) for line in path.read_text().splitlines()
-             if line and not line.startswith("#")]
-    return "\n".join(f"- `{subject}`: {reason}" for subject, reason in lines)
+    subjects = {}
+    for line in path.read_text().splitlines():
+        if line and not line.startswith("#"):
+            subject, reason = line.split("\t", 1)
+            subjects.setdefault(reason, []).append(f"`{subject}`")
+    return "\n".join(f"- {', '.join(each)}: {reason}" for reason, each in subjects.items())
 
 
 def document(figures):

@@ -1,9 +1,10 @@
 #!/usr/bin/env python3
 """uncovered.py REPORT: the figures of gcovr's JSON report, for scripts/coverage.sh.
 
-Prints a row for each folder, writes docs/figures/uncovered.txt (file:function, tab, lines) and
-compares it with docs/figures/explained.txt (pattern for file:function, tab, reason). Exits 1 when
-uncovered lines have no reason or fewer than LEAST_PERCENT of all lines are covered.
+Prints a row for each folder, writes docs/figures/uncovered.txt (file:function, tab, lines or
+branches) and compares it with docs/figures/explained.txt (pattern for file:function, tab, reason).
+Exits 1 when an uncovered line or branch has no reason or fewer than LEAST_PERCENT of all lines are
+covered.
 """
 import fnmatch
 import json
@@ -74,16 +75,18 @@ def main():
     explained = FIGURES / "explained.txt"
     texts = explained.read_text().splitlines() if explained.is_file() else []
     patterns = [each.split("\t")[0] for each in texts if each and not each.startswith("#")]
-    unexplained = [place for place in lines_at
-                   if not any(fnmatch.fnmatchcase(place, pattern) for pattern in patterns)]
-    for place in sorted(unexplained):
-        print(f"coverage: no reason for {place}, lines {ranges(lines_at[place])}", file=sys.stderr)
+    unexplained = 0
+    for what, places in (("lines", lines_at), ("branches", branches_at)):
+        for place, at in sorted(places.items()):
+            if not any(fnmatch.fnmatchcase(place, pattern) for pattern in patterns):
+                unexplained += 1
+                print(f"coverage: no reason for {place}, {what} {ranges(sorted(set(at)))}", file=sys.stderr)
     for pattern in patterns:
-        if not fnmatch.filter(lines_at, pattern):
+        if not fnmatch.filter(list(lines_at) + list(branches_at), pattern):
             print(f"coverage: nothing uncovered any more at {pattern}", file=sys.stderr)
     if percent < LEAST_PERCENT:
         print(f"coverage: below {LEAST_PERCENT} percent", file=sys.stderr)
-    sys.exit(1 if unexplained or percent < LEAST_PERCENT else 0)
+    sys.exit(1 if unexplained > 0 or percent < LEAST_PERCENT else 0)
 
 
 def row(folder, lines, covered, branches, taken):
