@@ -51,7 +51,7 @@ bool decode_bundle(aac_decoder *d, const wexa_frame *frame, bundle_view *view,
 }  // namespace
 
 int32_t xaac_init(void) {
-    av_quiet();
+    av_prepare();
     return 0;
 }
 

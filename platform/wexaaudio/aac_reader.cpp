@@ -166,7 +166,7 @@ bool open_stream(aac_reader *r) {
 }  // namespace
 
 void *xaacfd_create(const mtsrc_io *io, int64_t * /*word*/, xaac_info *info, void * /*reserved*/) {
-    av_quiet();
+    av_prepare();
     aac_reader *r = static_cast<aac_reader *>(calloc(1, sizeof(aac_reader)));
     if (r == nullptr || info == nullptr) {
         free(r);

@@ -10,6 +10,7 @@
 
 extern "C" {
 #include <libavcodec/avcodec.h>
+#include <libavutil/mem.h>
 }
 
 namespace {
@@ -18,10 +19,15 @@ constexpr int32_t kMaxExtraBytes = 1 << 24;
 constexpr int32_t kMaxPacketBytes = 1 << 24;
 constexpr int32_t kMixBlock = 1024;  // sample frames converted at a time for the mean
 
-pthread_once_t quiet_once = PTHREAD_ONCE_INIT;
+// libavutil's largest block. A table of all frames of a day of song is smaller, and a damaged count
+// asks for gigabytes.
+constexpr size_t kMaxBlockBytes = size_t{128} << 20;
 
-void set_quiet(void) {
+pthread_once_t prepare_once = PTHREAD_ONCE_INIT;
+
+void prepare(void) {
     av_log_set_level(AV_LOG_QUIET);
+    av_max_alloc(kMaxBlockBytes);
 }
 
 bool set_extra(AVCodecContext *ctx, const av_setup *setup) {
@@ -130,12 +136,12 @@ bool convert_mean(const AVFrame *frame, int32_t skip, int32_t count, int16_t *ou
 
 }  // namespace
 
-void av_quiet(void) {
-    pthread_once(&quiet_once, set_quiet);
+void av_prepare(void) {
+    pthread_once(&prepare_once, prepare);
 }
 
 bool av_decoder_open(av_decoder *d, const char *name, const av_setup *setup) {
-    av_quiet();
+    av_prepare();
     av_decoder_close(d);
     const AVCodec *codec = avcodec_find_decoder_by_name(name);
     d->ctx = codec != nullptr ? avcodec_alloc_context3(codec) : nullptr;

@@ -58,7 +58,8 @@ int32_t av_decoder_channels(const av_decoder *d);  // likewise
 int32_t av_decoder_pcm(const av_decoder *d, av_channels policy, int32_t own, int32_t skip,
                        int32_t count, void *pcm, int32_t capacity);
 
-// libavcodec and libavformat say nothing on standard error; called by every xxx_init and create.
-void av_quiet(void);
+// libavcodec and libavformat say nothing on standard error and ask for no huge blocks, in the whole
+// process; called by every xxx_init and create.
+void av_prepare(void);
 
 #endif

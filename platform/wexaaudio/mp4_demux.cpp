@@ -99,7 +99,7 @@ int32_t read_mpeg(aac_stream *s, void *buf, int32_t size, int32_t *bytes, int64_
 }  // namespace
 
 void *xmp4fd_create(const mtsrc_io *io, int32_t * /*word*/, xmp4_info *info, void * /*reserved*/) {
-    av_quiet();
+    av_prepare();
     mp4_demux *d = static_cast<mp4_demux *>(calloc(1, sizeof(mp4_demux)));
     if (d == nullptr || info == nullptr) {
         free(d);

@@ -97,7 +97,7 @@ int32_t write_next(ogg_demux *d, int64_t k, int32_t inside, void *buf, int32_t s
 }  // namespace
 
 void *xoggd_create(const mtsrc_io *io, int64_t * /*word*/, xogg_info *info, void * /*reserved*/) {
-    av_quiet();
+    av_prepare();
     ogg_demux *d = static_cast<ogg_demux *>(calloc(1, sizeof(ogg_demux)));
     if (d == nullptr || info == nullptr) {
         free(d);

@@ -59,7 +59,7 @@ int32_t decode_packets(vorbis_decoder *d, bundle_view *view) {
 }  // namespace
 
 int32_t xvorbis_init(void) {
-    av_quiet();
+    av_prepare();
     return 0;
 }
 
