@@ -58,7 +58,7 @@ inline void release() {
     changed.notify_all();
 }
 
-inline TAVO_CTX *create(const std::string &path, int32_t mode, int32_t *err) {
+inline TAVO_CTX *create(const std::string &path, int32_t mode, int32_t *err = nullptr) {
     expect_none();
     fnamedec = "";
     const TAVO_PARAM param = {path.c_str(), mode};
