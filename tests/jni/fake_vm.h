@@ -17,16 +17,30 @@ struct event {
     jint what, arg1, arg2;
     bool has_beats;
     std::vector<float> beats;
-    bool on_attached_thread;  // a thread that the bridge attached
 };
 
-// Forgets everything but the global references that are out. The calling thread becomes a thread of
-// the machine's own.
+// What the machine has seen, and what is out of it at this moment.
+struct record {
+    std::string calls;  // a space behind each
+    std::vector<event> events;
+    std::string violations;     // lines "function: what was wrong"
+    std::string log;            // the bridge's lines "priority: text"
+    int global_references = 0;  // like the local ones without those that the functions below made
+    int local_references = 0;
+    int held_characters = 0;
+    int attached_threads = 0;        // by the bridge, and not detached
+    bool exception_pending = false;  // on the calling thread
+};
+record seen();
+std::string take_calls();  // and forgets them
+std::string take_log();
+
+// Forgets everything but what is out. The calling thread becomes one of the machine's own.
 void reset();
 
 JavaVM *machine();
-JNIEnv *environment();  // of the calling thread, which must be attached
-jobject new_object();   // a local reference of the calling thread's, as a native method is given
+JNIEnv *environment();  // of the calling thread, which becomes the machine's own if it is unknown
+jobject new_object();   // a local reference, as a native method is given
 jstring new_string(const std::string &text);
 
 // The n-th call of a function from now on fails (1 the next one), as the interface says: null with
@@ -35,22 +49,6 @@ void fail(const std::string &function, int nth = 1);
 
 // Runs inside the Java method, on its thread.
 void on_event(std::function<void()> action);
-
-// What the machine has seen, and what is out of it at this moment.
-struct record {
-    std::vector<std::string> calls;
-    std::vector<event> events;
-    std::vector<std::string> violations;  // "function: what was wrong"
-    std::vector<std::string> log;         // as a device would show it: "priority/tag: text"
-    int global_references;
-    int local_references;  // without those that new_object and new_string made
-    int held_characters;
-    int attached_threads;    // attached by the bridge and not detached
-    bool exception_pending;  // on the calling thread
-};
-record seen();
-void forget_calls();
-void forget_log();
 
 }  // namespace fake_vm
 
