@@ -1,13 +1,15 @@
 package com.kestu.tavo;
 
 import java.io.File;
-import java.io.FileInputStream;
 import java.io.IOException;
+import java.io.InputStream;
 import java.lang.management.ManagementFactory;
 import java.lang.ref.WeakReference;
 import java.nio.file.Files;
 import java.nio.file.Path;
 import java.nio.file.Paths;
+import java.util.concurrent.CountDownLatch;
+import java.util.concurrent.TimeUnit;
 import java.util.regex.Matcher;
 import java.util.regex.Pattern;
 import javax.management.ObjectName;
@@ -20,7 +22,6 @@ import javax.management.ObjectName;
  */
 public final class BridgeTest {
     private static final int CYCLES = 1000;
-    private static final long EVENT_TIMEOUT_MS = 120_000;
 
     private static String song;
     private static String clip;
@@ -31,15 +32,11 @@ public final class BridgeTest {
         clip = arguments[1];
         directory = Paths.get(arguments[2]);
         Analyze.writeNoClickTrack();
-        analyzeBeforeInit();
+        everyCallTwice();
         unusableFiles();
         allModes();
-        everythingTwice();
-        deinitDuringAJob();
-        listenerThatThrows();
-        listenerThatCallsDeinit();
-        pathsThatAreNotAscii();
-        fileDescriptors();
+        listenerThatCallsDeinitAndThrows();
+        oddNamesAndDescriptors();
         forgottenObject();
         manyCycles();
         System.out.println("all cases passed");
@@ -55,64 +52,66 @@ public final class BridgeTest {
 
     /** Keeps the events of one analysis. */
     private static class Recorder implements TavoListener {
-        int results;
-        int failures;
-        int highlightMs = -1;
-        float[] beatsMs;
-        Thread thread;
-        Tavo sender;
+        final CountDownLatch told = new CountDownLatch(1);
+        volatile int results;
+        volatile int failures;
+        volatile int highlightMs;
+        volatile float[] beatsMs;
 
         @Override
-        public synchronized void onResult(Tavo tavo, int highlight, float[] beats) {
+        public void onResult(Tavo tavo, int highlight, float[] beats) {
             ++results;
+            highlightMs = highlight;
             beatsMs = beats;
-            take(tavo, highlight);
+            told.countDown();
         }
 
         @Override
-        public synchronized void onFailure(Tavo tavo, int highlight) {
+        public void onFailure(Tavo tavo, int highlight) {
             ++failures;
-            take(tavo, highlight);
+            told.countDown();
         }
 
-        private void take(Tavo tavo, int highlight) {
-            highlightMs = highlight;
-            sender = tavo;
-            thread = Thread.currentThread();
-            notifyAll();
-        }
-
-        synchronized int events() {
-            return results + failures;
-        }
-
-        synchronized void await() throws InterruptedException {
-            long end = System.currentTimeMillis() + EVENT_TIMEOUT_MS;
-            while (events() == 0 && System.currentTimeMillis() < end) wait(EVENT_TIMEOUT_MS);
-            check(events(), 1, "events of one analysis");
+        void await() throws InterruptedException {
+            check(told.await(120, TimeUnit.SECONDS), "an event comes");
         }
     }
 
-    /** Runs one analysis from init to deinit and returns what came of it. */
-    private static Recorder analyze(String path, int mode) throws InterruptedException {
-        Recorder recorder = new Recorder();
+    private static Tavo start(Recorder recorder, String path, int mode) {
         Tavo tavo = new Tavo(recorder);
         check(tavo.init(path, mode), 0, "init of " + path);
         check(tavo.analyze(0, 0, 0), 0, "analyze");
-        recorder.await();
+        return tavo;
+    }
+
+    private static void end(Tavo tavo, Recorder recorder) {
         check(tavo.deinit(), 0, "deinit");
-        check(recorder.events(), 1, "events of one analysis");
-        check(recorder.sender == tavo, "the event names its object");
-        check(recorder.thread != Thread.currentThread(), "the event has a thread of its own");
+        check(recorder.results + recorder.failures, 1, "events of one analysis");
+    }
+
+    /** Runs one analysis from init to deinit and returns its result. */
+    private static Recorder analyze(String path, int mode) throws InterruptedException {
+        Recorder recorder = new Recorder();
+        Tavo tavo = start(recorder, path, mode);
+        recorder.await();
+        end(tavo, recorder);
+        check(recorder.results, 1, "results");
         return recorder;
     }
 
-    private static void analyzeBeforeInit() {
+    private static void everyCallTwice() throws InterruptedException {
+        check(new Tavo(new Recorder()).analyze(0, 0, 0), 0, "analyze before init");
+        check(new Tavo(new Recorder()).deinit(), 0, "deinit before init");
         Recorder recorder = new Recorder();
-        Tavo tavo = new Tavo(recorder);
-        check(tavo.analyze(0, 0, 0), 0, "analyze before init");
-        check(tavo.deinit(), 0, "deinit before init");
-        check(recorder.events(), 0, "events without an analysis");
+        Tavo tavo = start(recorder, song, Tavo.MODE_BEATS);
+        check(tavo.init(song, Tavo.MODE_HIGHLIGHT), Tavo.ERROR_BUSY, "second init");
+        check(tavo.analyze(0, 0, 0), -1, "second analyze");
+        recorder.await();
+        check(tavo.analyze(0, 0, 0), -1, "analyze after the event");
+        end(tavo, recorder);
+        check(tavo.deinit(), 0, "second deinit");
+        check(tavo.analyze(0, 0, 0), 0, "analyze after deinit");
+        check(recorder.results, 1, "results");
     }
 
     private static void unusableFiles() throws IOException {
@@ -133,17 +132,14 @@ public final class BridgeTest {
 
     private static void allModes() throws InterruptedException {
         Recorder highlight = analyze(song, Tavo.MODE_HIGHLIGHT);
-        check(highlight.results, 1, "results of mode 0");
         check(highlight.beatsMs.length, 0, "beats of mode 0");
         check(Math.abs(highlight.highlightMs - 6000) <= 2000, "highlight " + highlight.highlightMs);
 
         Recorder beats = analyze(song, Tavo.MODE_BEATS);
-        check(beats.results, 1, "results of mode 1");
         check(beats.highlightMs, 0, "highlight of mode 1");
         onTheGrid(beats.beatsMs, 0);
 
         Recorder both = analyze(song, Tavo.MODE_BOTH);
-        check(both.results, 1, "results of mode 2");
         onTheGrid(both.beatsMs, both.highlightMs);
     }
 
@@ -159,101 +155,52 @@ public final class BridgeTest {
         check(4 * onHits >= 3 * beats.length, onHits + " of " + beats.length + " on the hits");
     }
 
-    private static void everythingTwice() throws InterruptedException {
-        Recorder recorder = new Recorder();
-        Tavo tavo = new Tavo(recorder);
-        check(tavo.init(song, Tavo.MODE_BEATS), 0, "init");
-        check(tavo.init(song, Tavo.MODE_HIGHLIGHT), Tavo.ERROR_BUSY, "second init");
-        check(tavo.analyze(0, 0, 0), 0, "analyze");
-        check(tavo.analyze(0, 0, 0), -1, "second analyze");
-        recorder.await();
-        check(tavo.analyze(0, 0, 0), -1, "analyze after the event");
-        check(tavo.deinit(), 0, "deinit");
-        check(tavo.deinit(), 0, "second deinit");
-        check(tavo.analyze(0, 0, 0), 0, "analyze after deinit");
-        check(recorder.results, 1, "results");
-        check(recorder.events(), 1, "events");
-    }
-
-    private static void deinitDuringAJob() {
-        for (int mode = Tavo.MODE_HIGHLIGHT; mode <= Tavo.MODE_BOTH; ++mode) {
-            Recorder recorder = new Recorder();
-            Tavo tavo = new Tavo(recorder);
-            check(tavo.init(song, mode), 0, "init");
-            check(tavo.analyze(0, 0, 0), 0, "analyze");
-            check(tavo.deinit(), 0, "deinit during a job");
-            check(recorder.events(), 1, "events before deinit returned");
-        }
-    }
-
-    private static void listenerThatThrows() throws InterruptedException {
+    private static void listenerThatCallsDeinitAndThrows() throws InterruptedException {
+        Thread caller = Thread.currentThread();
+        Tavo[] sender = new Tavo[1];
+        int[] code = new int[1];
         Recorder recorder = new Recorder() {
             @Override
-            public synchronized void onResult(Tavo tavo, int highlight, float[] beats) {
+            public void onResult(Tavo tavo, int highlight, float[] beats) {
+                if (Thread.currentThread() != caller) sender[0] = tavo;
+                code[0] = tavo.deinit();
                 super.onResult(tavo, highlight, beats);
                 throw new IllegalStateException("thrown by a listener");
             }
         };
-        Tavo tavo = new Tavo(recorder);
-        check(tavo.init(song, Tavo.MODE_BOTH), 0, "init");
-        check(tavo.analyze(0, 0, 0), 0, "analyze");
+        Tavo tavo = start(recorder, song, Tavo.MODE_BOTH);
         recorder.await();
-        check(tavo.deinit(), 0, "deinit after a listener has thrown");
-        check(analyze(song, Tavo.MODE_BOTH).results, 1, "results of the next analysis");
-    }
-
-    private static void listenerThatCallsDeinit() throws InterruptedException {
-        int[] code = new int[1];
-        Recorder recorder = new Recorder() {
-            @Override
-            public synchronized void onResult(Tavo tavo, int highlight, float[] beats) {
-                code[0] = tavo.deinit();
-                super.onResult(tavo, highlight, beats);
-            }
-        };
-        Tavo tavo = new Tavo(recorder);
-        check(tavo.init(clip, Tavo.MODE_HIGHLIGHT), 0, "init");
-        check(tavo.analyze(0, 0, 0), 0, "analyze");
-        recorder.await();
+        end(tavo, recorder);
+        check(sender[0] == tavo, "the event names its object, on a thread of its own");
         check(code[0], -1, "deinit inside an event");
-        check(tavo.deinit(), 0, "deinit");
+        analyze(song, Tavo.MODE_BOTH);
     }
 
-    private static void pathsThatAreNotAscii() throws Exception {
+    /** A descriptor alone is what applications have; also the way for names with emoji. */
+    private static void oddNamesAndDescriptors() throws Exception {
+        int expected = analyze(song, Tavo.MODE_HIGHLIGHT).highlightMs;
         Path copy = directory.resolve("Lied \u2013 \u00e4\u00f6\u00fc \u97f3\u697d.wav");
         Files.copy(Paths.get(song), copy);
-        int expected = analyze(song, Tavo.MODE_HIGHLIGHT).highlightMs;
         check(analyze(copy.toString(), Tavo.MODE_HIGHLIGHT).highlightMs, expected, "highlight");
-    }
 
-    /** What an application with a descriptor alone does; also the way for names with emoji. */
-    private static void fileDescriptors() throws Exception {
-        Path copy = directory.resolve("\ud83c\udfb5.wav");
-        Files.copy(Paths.get(song), copy);
-        check(new Tavo(new Recorder()).init(copy.toString(), Tavo.MODE_HIGHLIGHT),
-                Tavo.ERROR_UNUSABLE, "init of a name outside the basic plane");
-        int expected = analyze(song, Tavo.MODE_HIGHLIGHT).highlightMs;
-
+        Path emoji = Files.move(copy, directory.resolve("\ud83c\udfb5.wav"));
         Recorder recorder = new Recorder();
         Tavo tavo = new Tavo(recorder);
-        try (FileInputStream stream = new FileInputStream(copy.toFile())) {
-            check(stream.getFD().valid(), "the file is open");
-            check(tavo.init(descriptorOf(copy), Tavo.MODE_HIGHLIGHT), 0, "init of a descriptor");
-        }
-        check(tavo.analyze(0, 0, 0), 0, "analyze");  // the descriptor is closed by now
+        check(tavo.init(emoji.toString(), Tavo.MODE_HIGHLIGHT), Tavo.ERROR_UNUSABLE,
+                "init of a name outside the basic plane");
+        InputStream stream = Files.newInputStream(emoji);
+        check(tavo.init(descriptorOf(emoji), Tavo.MODE_HIGHLIGHT), 0, "init of a descriptor");
+        stream.close();
+        check(tavo.analyze(0, 0, 0), 0, "analyze");
         recorder.await();
-        check(tavo.deinit(), 0, "deinit");
+        end(tavo, recorder);
         check(recorder.highlightMs, expected, "highlight through a descriptor");
     }
 
     /** The path of this process's open descriptor of a file. */
     private static String descriptorOf(Path file) throws IOException {
         for (File each : new File("/proc/self/fd").listFiles()) {
-            try {
-                if (Files.isSameFile(each.toPath(), file)) return each.getPath();
-            } catch (IOException closedMeanwhile) {
-                continue;
-            }
+            if (each.exists() && Files.isSameFile(each.toPath(), file)) return each.getPath();
         }
         throw new AssertionError("no descriptor of " + file);
     }
@@ -268,26 +215,23 @@ public final class BridgeTest {
         }
         check(forgotten.get() == null, "a forgotten object is collected");
 
-        Recorder other = new Recorder();
-        Tavo next = new Tavo(other);
+        Tavo next = new Tavo(recorder);
         check(next.init(clip, Tavo.MODE_HIGHLIGHT), Tavo.ERROR_BUSY, "init beside a forgotten one");
         check(next.deinit(), 0, "deinit of a forgotten one");
-        check(analyze(clip, Tavo.MODE_HIGHLIGHT).results, 1, "results after a forgotten one");
-        check(recorder.events() + other.events(), 0, "events of a forgotten object");
+        analyze(clip, Tavo.MODE_HIGHLIGHT);
+        check(recorder.results + recorder.failures, 0, "events of a forgotten object");
     }
 
+    /** Every other one ends its job while it runs. */
     private static void manyCycles() throws Exception {
         for (int i = 0; i < 10; ++i) analyze(clip, Tavo.MODE_HIGHLIGHT);
         long references = globalReferences();
         int threads = ManagementFactory.getThreadMXBean().getThreadCount();
         for (int i = 0; i < CYCLES; ++i) {
             Recorder recorder = new Recorder();
-            Tavo tavo = new Tavo(recorder);
-            check(tavo.init(clip, i % 3), 0, "init");
-            check(tavo.analyze(0, 0, 0), 0, "analyze");
+            Tavo tavo = start(recorder, clip, i % 3);
             if (i % 2 == 0) recorder.await();
-            check(tavo.deinit(), 0, "deinit");
-            check(recorder.events(), 1, "events of a cycle");
+            end(tavo, recorder);
         }
         check(globalReferences(), references, "global references after " + CYCLES + " cycles");
         check(ManagementFactory.getThreadMXBean().getThreadCount(), threads, "threads");

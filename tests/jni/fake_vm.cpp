@@ -46,9 +46,7 @@ void require(bool holds, const std::string &function, const std::string &what) {
     if (!holds) now.violations += function + ": " + what + "\n";
 }
 
-// Of a call of the machine itself. False: it is to fail.
-bool enter_machine(const std::string &function) {
-    now.calls += function + " ";
+bool succeeds(const std::string &function) {
     return function != failing || --calls_to_failure != 0;
 }
 
@@ -56,16 +54,17 @@ uintptr_t handle_of(const void *object) {
     return reinterpret_cast<uintptr_t>(object);
 }
 
-// Of a call of an environment. False: it is to fail, and the exception is pending.
+// At the beginning of each call. False: it is to fail, and the exception is pending.
 bool enter(const std::string &function, const std::vector<jobject> &passed = {}) {
     require(this_thread != thread_kind::unknown, function, "thread not attached");
     require(!pending || kAlwaysAllowed.count(function) != 0, function, "exception pending");
     for (const jobject each : passed) {
-        require(references.count(handle_of(each)) != 0, function, "not a live reference");
+        const bool lives = each == nullptr || references.count(handle_of(each)) != 0;
+        require(lives, function, "not a live reference");
     }
-    const bool succeeds = enter_machine(function);
-    if (!succeeds) pending = true;
-    return succeeds;
+    if (succeeds(function)) return true;
+    pending = true;
+    return false;
 }
 
 template <typename T>
@@ -125,10 +124,9 @@ void JNICALL delete_local_ref(JNIEnv *, jobject object) {
     drop("DeleteLocalRef", object, false);
 }
 
-const char *JNICALL get_string_utf_chars(JNIEnv *, jstring string, jboolean *is_copy) {
+const char *JNICALL get_string_utf_chars(JNIEnv *, jstring string, jboolean *) {
     guard hold(lock);
     if (!enter("GetStringUTFChars", {string})) return nullptr;
-    if (is_copy != nullptr) *is_copy = JNI_FALSE;
     ++now.held_characters;
     return references[handle_of(string)].text.c_str();
 }
@@ -152,10 +150,9 @@ void JNICALL set_float_array_region(JNIEnv *, jfloatArray array, jsize start, js
     guard hold(lock);
     enter("SetFloatArrayRegion", {array});
     std::vector<float> &floats = references[handle_of(array)].floats;
-    const bool inside =
-        start >= 0 && length >= 0 && static_cast<size_t>(start + length) <= floats.size();
-    require(inside, "SetFloatArrayRegion", "outside the array");
-    if (inside) std::copy(from, from + length, floats.begin() + start);
+    const bool whole = start == 0 && length == static_cast<jsize>(floats.size());
+    require(whole, "SetFloatArrayRegion", "not the whole array");
+    if (whole) std::copy(from, from + length, floats.begin());
 }
 
 void JNICALL call_static_void_method(JNIEnv *, jclass of, jmethodID method, va_list args) {
@@ -170,11 +167,7 @@ void JNICALL call_static_void_method(JNIEnv *, jclass of, jmethodID method, va_l
     got.has_beats = array != nullptr;
     if (got.has_beats) got.beats = references[handle_of(array)].floats;
     now.events.push_back(got);
-
-    std::vector<jobject> passed = {of};
-    if (got.object != nullptr) passed.push_back(got.object);
-    if (got.has_beats) passed.push_back(array);
-    const bool throws = !enter(name, passed);
+    const bool throws = !enter(name, {of, got.object, array});
     require(references[handle_of(of)].global, name, "a class of another thread's");
     require(method == kMethod, name, "not the method that was looked up");
     const std::function<void()> action = event_action;
@@ -203,7 +196,7 @@ jint JNICALL get_env(JavaVM *, void **env, jint version) {
     guard hold(lock);
     require(version == JNI_VERSION_1_6, "GetEnv", "another version");
     *env = nullptr;
-    if (!enter_machine("GetEnv")) return JNI_EVERSION;
+    if (!succeeds("GetEnv")) return JNI_EVERSION;
     if (this_thread == thread_kind::unknown) return JNI_EDETACHED;
     *env = environment();
     return JNI_OK;
@@ -212,7 +205,7 @@ jint JNICALL get_env(JavaVM *, void **env, jint version) {
 jint JNICALL attach_current_thread(JavaVM *, void **env, void *) {
     guard hold(lock);
     *env = nullptr;
-    if (!enter_machine("AttachCurrentThread")) return JNI_ERR;
+    if (!succeeds("AttachCurrentThread")) return JNI_ERR;
     require(this_thread == thread_kind::unknown, "AttachCurrentThread", "attached already");
     this_thread = thread_kind::attached;
     ++now.attached_threads;
@@ -222,17 +215,11 @@ jint JNICALL attach_current_thread(JavaVM *, void **env, void *) {
 
 jint JNICALL detach_current_thread(JavaVM *) {
     guard hold(lock);
-    enter_machine("DetachCurrentThread");
     require(this_thread == thread_kind::attached, "DetachCurrentThread", "not attached by it");
     require(!pending, "DetachCurrentThread", "exception pending");
     this_thread = thread_kind::unknown;
     --now.attached_threads;
     return JNI_OK;
-}
-
-std::string take(std::string *text) {
-    guard hold(lock);
-    return std::exchange(*text, std::string());
 }
 
 }  // namespace
@@ -244,17 +231,13 @@ record seen() {
     return copy;
 }
 
-std::string take_calls() {
-    return take(&now.calls);
-}
-
 std::string take_log() {
-    return take(&now.log);
+    guard hold(lock);
+    return std::exchange(now.log, std::string());
 }
 
 void reset() {
     guard hold(lock);
-    now.calls.clear();
     now.events.clear();
     now.violations.clear();
     now.log.clear();

@@ -1,6 +1,6 @@
-// A Java virtual machine made of a recorded function table: it keeps the order of the calls, knows
-// which references and characters are out, and can be told which function fails. It also holds its
-// callers to the rules of the interface; what breaks one is kept in `violations`.
+// A Java virtual machine made of a recorded function table: it knows which references and
+// characters are out, and can be told which function fails. It also holds its callers to the rules
+// of the interface; what breaks one is kept in `violations`.
 #ifndef TAVO_TESTS_JNI_FAKE_VM_H
 #define TAVO_TESTS_JNI_FAKE_VM_H
 
@@ -21,7 +21,6 @@ struct event {
 
 // What the machine has seen, and what is out of it at this moment.
 struct record {
-    std::string calls;  // a space behind each
     std::vector<event> events;
     std::string violations;     // lines "function: what was wrong"
     std::string log;            // the bridge's lines "priority: text"
@@ -32,8 +31,7 @@ struct record {
     bool exception_pending = false;  // on the calling thread
 };
 record seen();
-std::string take_calls();  // and forgets them
-std::string take_log();
+std::string take_log();  // and forgets it
 
 // Forgets everything but what is out. The calling thread becomes one of the machine's own.
 void reset();
