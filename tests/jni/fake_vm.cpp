@@ -1,6 +1,5 @@
 #include "tests/jni/fake_vm.h"
 
-#include <algorithm>
 #include <cstdarg>
 #include <cstdint>
 #include <cstdio>
@@ -29,7 +28,8 @@ const std::set<std::string> kAlwaysAllowed = {"DeleteGlobalRef", "DeleteLocalRef
 
 std::mutex lock;  // guards everything below but the thread's own state
 record now;
-std::map<uintptr_t, reference> references;  // a handle is never given twice
+std::string log_lines;
+std::map<jobject, reference> references;  // no handle is given twice
 uintptr_t next_handle = 0x1000;
 std::string failing;
 int calls_to_failure = 0;
@@ -50,16 +50,12 @@ bool succeeds(const std::string &function) {
     return function != failing || --calls_to_failure != 0;
 }
 
-uintptr_t handle_of(const void *object) {
-    return reinterpret_cast<uintptr_t>(object);
-}
-
 // At the beginning of each call. False: it is to fail, and the exception is pending.
 bool enter(const std::string &function, const std::vector<jobject> &passed = {}) {
     require(this_thread != thread_kind::unknown, function, "thread not attached");
     require(!pending || kAlwaysAllowed.count(function) != 0, function, "exception pending");
     for (const jobject each : passed) {
-        const bool lives = each == nullptr || references.count(handle_of(each)) != 0;
+        const bool lives = each == nullptr || references.count(each) != 0;
         require(lives, function, "not a live reference");
     }
     if (succeeds(function)) return true;
@@ -67,180 +63,173 @@ bool enter(const std::string &function, const std::vector<jobject> &passed = {})
     return false;
 }
 
-template <typename T>
-T add(reference made) {
-    references[next_handle] = std::move(made);
-    return reinterpret_cast<T>(next_handle++);
+jobject add(reference made) {
+    const jobject handle = reinterpret_cast<jobject>(next_handle++);
+    references[handle] = std::move(made);
+    return handle;
 }
 
 template <typename T>
-T add_local(reference made = {}) {
-    ++now.local_references;
-    return add<T>(std::move(made));
+T lend(reference made = {}) {
+    ++now.lent;
+    return static_cast<T>(add(std::move(made)));
 }
 
 void drop(const char *function, jobject object, bool global) {
-    require(references[handle_of(object)].global == global, function, "another kind of reference");
-    references.erase(handle_of(object));
-    --(global ? now.global_references : now.local_references);
+    enter(function, {object});
+    require(references[object].global == global, function, "another kind of reference");
+    references.erase(object);
+    --(global ? now.global_references : now.lent);
 }
 
-// The functions of the two tables.
-
-jclass JNICALL get_object_class(JNIEnv *, jobject object) {
-    guard hold(lock);
-    return enter("GetObjectClass", {object}) ? add_local<jclass>() : nullptr;
-}
-
-jclass JNICALL find_class(JNIEnv *, const char *name) {
-    guard hold(lock);
-    require(name == std::string("com/kestu/tavo/Tavo"), "FindClass", name);
-    return enter("FindClass") ? add_local<jclass>() : nullptr;
-}
-
-jmethodID JNICALL get_static_method_id(JNIEnv *, jclass of, const char *name, const char *type) {
-    guard hold(lock);
-    require(name + std::string(type) == "postEventFromNative(Ljava/lang/Object;III[F)V",
-            "GetStaticMethodID", name);
-    return enter("GetStaticMethodID", {of}) ? kMethod : nullptr;
-}
-
-jobject JNICALL new_global_ref(JNIEnv *, jobject object) {
-    guard hold(lock);
-    if (!enter("NewGlobalRef", {object})) return nullptr;
-    ++now.global_references;
-    return add<jobject>({true, {}, {}});
-}
-
-void JNICALL delete_global_ref(JNIEnv *, jobject object) {
-    guard hold(lock);
-    enter("DeleteGlobalRef", {object});
-    drop("DeleteGlobalRef", object, true);
-}
-
-void JNICALL delete_local_ref(JNIEnv *, jobject object) {
-    guard hold(lock);
-    enter("DeleteLocalRef", {object});
-    drop("DeleteLocalRef", object, false);
-}
-
-const char *JNICALL get_string_utf_chars(JNIEnv *, jstring string, jboolean *) {
-    guard hold(lock);
-    if (!enter("GetStringUTFChars", {string})) return nullptr;
-    ++now.held_characters;
-    return references[handle_of(string)].text.c_str();
-}
-
-void JNICALL release_string_utf_chars(JNIEnv *, jstring string, const char *chars) {
-    guard hold(lock);
-    enter("ReleaseStringUTFChars", {string});
-    require(chars == references[handle_of(string)].text.c_str(), "ReleaseStringUTFChars",
-            "not the characters of the string");
-    --now.held_characters;
-}
-
-jfloatArray JNICALL new_float_array(JNIEnv *, jsize length) {
-    guard hold(lock);
-    if (!enter("NewFloatArray")) return nullptr;
-    return add_local<jfloatArray>({false, std::vector<float>(static_cast<size_t>(length)), {}});
-}
-
-void JNICALL set_float_array_region(JNIEnv *, jfloatArray array, jsize start, jsize length,
-                                    const jfloat *from) {
-    guard hold(lock);
-    enter("SetFloatArrayRegion", {array});
-    std::vector<float> &floats = references[handle_of(array)].floats;
-    const bool whole = start == 0 && length == static_cast<jsize>(floats.size());
-    require(whole, "SetFloatArrayRegion", "not the whole array");
-    if (whole) std::copy(from, from + length, floats.begin());
-}
-
-void JNICALL call_static_void_method(JNIEnv *, jclass of, jmethodID method, va_list args) {
+void call_java(jclass of, jmethodID method, va_list args) {
     const char *const name = "CallStaticVoidMethod";
     std::unique_lock<std::mutex> hold(lock);
     event got = {};
     got.object = va_arg(args, jobject);
-    got.what = va_arg(args, jint);
-    got.arg1 = va_arg(args, jint);
-    got.arg2 = va_arg(args, jint);
+    for (int i = 0; i < 3; ++i) got.numbers.push_back(va_arg(args, jint));
     const jobject array = va_arg(args, jobject);
-    got.has_beats = array != nullptr;
-    if (got.has_beats) got.beats = references[handle_of(array)].floats;
+    if (array != nullptr) got.beats = references[array].floats;
     now.events.push_back(got);
+
     const bool throws = !enter(name, {of, got.object, array});
-    require(references[handle_of(of)].global, name, "a class of another thread's");
+    require(references[of].global, name, "a class of another thread's");
     require(method == kMethod, name, "not the method that was looked up");
-    const std::function<void()> action = event_action;
     pending = false;  // the method is still running
+    const std::function<void()> action = event_action;
     hold.unlock();
     if (action) action();
     hold.lock();
-    // What the Java method was given stays alive for as long as it runs.
-    require(references.count(handle_of(of)) != 0, name, "the class is gone");
+    require(references.count(of) != 0, name, "the class is gone while it runs");
     pending = throws;
 }
 
-jboolean JNICALL exception_check(JNIEnv *) {
-    guard hold(lock);
-    enter("ExceptionCheck");
-    return pending ? JNI_TRUE : JNI_FALSE;
+void put_references(JNINativeInterface_ *table) {
+    table->GetObjectClass = [](JNIEnv *, jobject object) {
+        guard hold(lock);
+        return enter("GetObjectClass", {object}) ? lend<jclass>() : nullptr;
+    };
+    table->FindClass = [](JNIEnv *, const char *name) {
+        guard hold(lock);
+        require(name == std::string("com/kestu/tavo/Tavo"), "FindClass", name);
+        return enter("FindClass") ? lend<jclass>() : nullptr;
+    };
+    table->NewGlobalRef = [](JNIEnv *, jobject object) {
+        guard hold(lock);
+        if (!enter("NewGlobalRef", {object})) return jobject{};
+        ++now.global_references;
+        return add({true, {}, {}});
+    };
+    table->DeleteGlobalRef = [](JNIEnv *, jobject object) {
+        guard hold(lock);
+        drop("DeleteGlobalRef", object, true);
+    };
+    table->DeleteLocalRef = [](JNIEnv *, jobject object) {
+        guard hold(lock);
+        drop("DeleteLocalRef", object, false);
+    };
 }
 
-void JNICALL exception_clear(JNIEnv *) {
-    guard hold(lock);
-    enter("ExceptionClear");
-    pending = false;
+void put_values(JNINativeInterface_ *table) {
+    table->GetStringUTFChars = [](JNIEnv *, jstring string, jboolean *) {
+        guard hold(lock);
+        if (!enter("GetStringUTFChars", {string})) return static_cast<const char *>(nullptr);
+        ++now.lent;
+        return references[string].text.c_str();
+    };
+    table->ReleaseStringUTFChars = [](JNIEnv *, jstring string, const char *chars) {
+        guard hold(lock);
+        enter("ReleaseStringUTFChars", {string});
+        require(chars == references[string].text.c_str(), "ReleaseStringUTFChars",
+                "not its characters");
+        --now.lent;
+    };
+    table->NewFloatArray = [](JNIEnv *, jsize length) {
+        guard hold(lock);
+        if (!enter("NewFloatArray")) return jfloatArray{};
+        return lend<jfloatArray>({false, std::vector<float>(static_cast<size_t>(length)), {}});
+    };
+    table->SetFloatArrayRegion = [](JNIEnv *, jfloatArray array, jsize start, jsize length,
+                                    const jfloat *from) {
+        guard hold(lock);
+        enter("SetFloatArrayRegion", {array});
+        std::vector<float> &floats = references[array].floats;
+        const bool whole = start == 0 && length == static_cast<jsize>(floats.size());
+        require(whole, "SetFloatArrayRegion", "not the whole array");
+        floats.assign(from, from + length);
+    };
 }
 
-jint JNICALL get_env(JavaVM *, void **env, jint version) {
-    guard hold(lock);
-    require(version == JNI_VERSION_1_6, "GetEnv", "another version");
-    *env = nullptr;
-    if (!succeeds("GetEnv")) return JNI_EVERSION;
-    if (this_thread == thread_kind::unknown) return JNI_EDETACHED;
-    *env = environment();
-    return JNI_OK;
+void put_calls(JNINativeInterface_ *table) {
+    table->GetStaticMethodID = [](JNIEnv *, jclass of, const char *name, const char *type) {
+        guard hold(lock);
+        require(name + std::string(type) == "postEventFromNative(Ljava/lang/Object;III[F)V",
+                "GetStaticMethodID", name);
+        return enter("GetStaticMethodID", {of}) ? kMethod : nullptr;
+    };
+    table->CallStaticVoidMethodV = [](JNIEnv *, jclass of, jmethodID method, va_list args) {
+        call_java(of, method, args);
+    };
+    table->ExceptionCheck = [](JNIEnv *) {
+        guard hold(lock);
+        enter("ExceptionCheck");
+        return static_cast<jboolean>(pending);
+    };
+    table->ExceptionClear = [](JNIEnv *) {
+        guard hold(lock);
+        enter("ExceptionClear");
+        pending = false;
+    };
 }
 
-jint JNICALL attach_current_thread(JavaVM *, void **env, void *) {
-    guard hold(lock);
-    *env = nullptr;
-    if (!succeeds("AttachCurrentThread")) return JNI_ERR;
-    require(this_thread == thread_kind::unknown, "AttachCurrentThread", "attached already");
-    this_thread = thread_kind::attached;
-    ++now.attached_threads;
-    *env = environment();
-    return JNI_OK;
-}
-
-jint JNICALL detach_current_thread(JavaVM *) {
-    guard hold(lock);
-    require(this_thread == thread_kind::attached, "DetachCurrentThread", "not attached by it");
-    require(!pending, "DetachCurrentThread", "exception pending");
-    this_thread = thread_kind::unknown;
-    --now.attached_threads;
-    return JNI_OK;
+void put_threads(JNIInvokeInterface_ *table) {
+    table->GetEnv = [](JavaVM *, void **env, jint version) {
+        guard hold(lock);
+        require(version == JNI_VERSION_1_6, "GetEnv", "another version");
+        *env = nullptr;
+        if (!succeeds("GetEnv")) return JNI_EVERSION;
+        if (this_thread == thread_kind::unknown) return JNI_EDETACHED;
+        *env = environment();
+        return JNI_OK;
+    };
+    table->AttachCurrentThread = [](JavaVM *, void **env, void *) {
+        guard hold(lock);
+        *env = nullptr;
+        if (!succeeds("AttachCurrentThread")) return JNI_ERR;
+        require(this_thread == thread_kind::unknown, "AttachCurrentThread", "attached already");
+        this_thread = thread_kind::attached;
+        ++now.lent;
+        *env = environment();
+        return JNI_OK;
+    };
+    table->DetachCurrentThread = [](JavaVM *) {
+        guard hold(lock);
+        require(this_thread == thread_kind::attached, "DetachCurrentThread", "not attached by it");
+        require(!pending, "DetachCurrentThread", "exception pending");
+        this_thread = thread_kind::unknown;
+        --now.lent;
+        return JNI_OK;
+    };
 }
 
 }  // namespace
 
 record seen() {
     guard hold(lock);
-    record copy = now;
-    copy.exception_pending = pending;
-    return copy;
+    now.exception_pending = pending;
+    return now;
 }
 
 std::string take_log() {
     guard hold(lock);
-    return std::exchange(now.log, std::string());
+    return std::exchange(log_lines, std::string());
 }
 
 void reset() {
     guard hold(lock);
     now.events.clear();
     now.violations.clear();
-    now.log.clear();
+    log_lines.clear();
     failing.clear();
     event_action = nullptr;
     this_thread = thread_kind::own;
@@ -250,9 +239,7 @@ void reset() {
 JavaVM *machine() {
     static const JNIInvokeInterface_ table = [] {
         JNIInvokeInterface_ made = {};
-        made.GetEnv = get_env;
-        made.AttachCurrentThread = attach_current_thread;
-        made.DetachCurrentThread = detach_current_thread;
+        put_threads(&made);
         return made;
     }();
     static JavaVM vm = {&table};
@@ -263,19 +250,9 @@ JavaVM *machine() {
 JNIEnv *environment() {
     static const JNINativeInterface_ table = [] {
         JNINativeInterface_ made = {};
-        made.GetObjectClass = get_object_class;
-        made.FindClass = find_class;
-        made.GetStaticMethodID = get_static_method_id;
-        made.NewGlobalRef = new_global_ref;
-        made.DeleteGlobalRef = delete_global_ref;
-        made.DeleteLocalRef = delete_local_ref;
-        made.GetStringUTFChars = get_string_utf_chars;
-        made.ReleaseStringUTFChars = release_string_utf_chars;
-        made.NewFloatArray = new_float_array;
-        made.SetFloatArrayRegion = set_float_array_region;
-        made.CallStaticVoidMethodV = call_static_void_method;
-        made.ExceptionCheck = exception_check;
-        made.ExceptionClear = exception_clear;
+        put_references(&made);
+        put_values(&made);
+        put_calls(&made);
         return made;
     }();
     static JNIEnv env = {&table};
@@ -285,12 +262,12 @@ JNIEnv *environment() {
 
 jobject new_object() {
     guard hold(lock);
-    return add<jobject>({});
+    return add({});
 }
 
 jstring new_string(const std::string &text) {
     guard hold(lock);
-    return add<jstring>({false, {}, text});
+    return static_cast<jstring>(add({false, {}, text}));
 }
 
 void fail(const std::string &function, int nth) {
@@ -316,7 +293,7 @@ extern "C" __attribute__((visibility("default"), format(printf, 3, 4))) int __an
     va_end(args);
     std::lock_guard<std::mutex> hold(fake_vm::lock);
     if (tag == std::string("tavo_jni")) {
-        fake_vm::now.log += std::to_string(prio) + ": " + text + "\n";
+        fake_vm::log_lines += std::to_string(prio) + ": " + text + "\n";
     }
     return 1;
 }
