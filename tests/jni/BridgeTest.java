@@ -31,7 +31,6 @@ public final class BridgeTest {
         clip = arguments[1];
         directory = Paths.get(arguments[2]);
         Analyze.writeNoClickTrack();
-        everyCallTwice();
         unusableFiles();
         listenerThatCallsDeinitAndThrows();
         oddNamesAndDescriptors();
@@ -95,21 +94,6 @@ public final class BridgeTest {
         end(tavo, recorder);
         check(recorder.results, 1, "results");
         return recorder;
-    }
-
-    private static void everyCallTwice() throws InterruptedException {
-        check(new Tavo(new Recorder()).analyze(0, 0, 0), 0, "analyze before init");
-        check(new Tavo(new Recorder()).deinit(), 0, "deinit before init");
-        Recorder recorder = new Recorder();
-        Tavo tavo = start(recorder, song, Tavo.MODE_BEATS);
-        check(tavo.init(song, Tavo.MODE_HIGHLIGHT), Tavo.ERROR_BUSY, "second init");
-        check(tavo.analyze(0, 0, 0), -1, "second analyze");
-        recorder.await();
-        check(tavo.analyze(0, 0, 0), -1, "analyze after the event");
-        end(tavo, recorder);
-        check(tavo.deinit(), 0, "second deinit");
-        check(tavo.analyze(0, 0, 0), 0, "analyze after deinit");
-        check(recorder.results, 1, "results");
     }
 
     private static void unusableFiles() {
