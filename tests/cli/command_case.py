@@ -1,29 +1,28 @@
-"""What the tests of the command share: running it, songs, files that cannot be used."""
+"""What the tests of the command share: running it, songs, what its output holds."""
 import json
 import os
 import pathlib
+import pwd
+import resource
 import shutil
 import struct
 import subprocess
-import sys
 import tempfile
 import unittest
 
-TAVO, MAKE_SONG = (os.path.abspath(sys.argv.pop(1)) for _ in range(2))
-HIT_GRID_S = 0.5  # 120 BPM, first hit at 0.5 s
+TAVO, MAKE_SONG = os.environ["TAVO"], os.environ["MAKE_SONG"]
 LOUD_S = 20.0
 
 _songs = tempfile.TemporaryDirectory()
 
 
-def song(name="song.wav", **options):
+def song(**options):
     """A song, made once for each set of options. Returns its path."""
-    key = "-".join(f"{k}{v}" for k, v in sorted(options.items()))
-    path = pathlib.Path(_songs.name, f"{key}-{name}")
+    arguments = [f"--{k.replace('_', '-')}={v}" for k, v in sorted(options.items())]
+    path = pathlib.Path(_songs.name, "".join(arguments) + ".wav")
     if not path.exists():
-        arguments = [f"--{k.replace('_', '-')}={v}".split("=") for k, v in options.items()]
-        subprocess.run([MAKE_SONG, path, *sum(arguments, [])], check=True,
-                       stdout=subprocess.DEVNULL)
+        subprocess.run([MAKE_SONG, path, *" ".join(arguments).replace("=", " ").split()],
+                       check=True, stdout=subprocess.DEVNULL)
     return path
 
 
@@ -45,11 +44,25 @@ def wav(seconds=2.0, rate=44100, channels=1, bits=16, tag=1, data_size=None, sam
     return head + b"data" + struct.pack("<I", size) + data
 
 
+def nobody():
+    """Options of a run: as a user who may not do everything."""
+    if os.getuid() != 0:
+        return {}
+    user = pwd.getpwnam("nobody")
+    return {"user": user.pw_uid, "group": user.pw_gid, "extra_groups": []}
+
+
+def file_limit(size):
+    """Options of a run: no file grows beyond so many bytes."""
+    return {"preexec_fn": lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (size, size))}
+
+
 class Case(unittest.TestCase):
     def setUp(self):
         folder = tempfile.TemporaryDirectory()
         self.addCleanup(folder.cleanup)
         self.folder = pathlib.Path(folder.name)
+        os.chmod(self.folder, 0o755)
 
     def put(self, name, content=None, source=None):
         path = self.folder / name
@@ -60,11 +73,20 @@ class Case(unittest.TestCase):
             path.write_bytes(content)
         return path
 
+    def put_hours_of_silence(self, name, hours):
+        """A song at 8000 Hz that takes no place on the disk."""
+        size = 2 * 8000 * 3600 * hours
+        head = wav(seconds=0, rate=8000, data_size=size)
+        os.truncate(self.put(name, head), len(head) + size)
+
+    def assert_only(self, *names):
+        """The folder holds these files and nothing else, hidden ones counted."""
+        self.assertEqual({p.name for p in self.folder.iterdir()}, set(names))
+
     def run_tavo(self, *arguments, status=0, **options):
         """Runs in the case's folder; arguments may be bytes. Output is bytes."""
-        options.setdefault("stdin", subprocess.DEVNULL)
-        if "input" in options:
-            options.pop("stdin")
+        if "input" not in options:
+            options["stdin"] = subprocess.DEVNULL
         done = subprocess.run([TAVO, *arguments], capture_output=True, cwd=self.folder,
                               timeout=250, **options)
         self.assertEqual(done.returncode, status, (arguments, done.stdout, done.stderr))
@@ -73,27 +95,9 @@ class Case(unittest.TestCase):
     def objects(self, text):
         """Each line one JSON object in strict UTF-8, NaN and the like refused."""
         self.assertTrue(text == b"" or text.endswith(b"\n"), text)
-
-        def refuse(word):
-            raise ValueError(word)
-
-        return [json.loads(line.decode("utf-8"), parse_constant=refuse)
+        return [json.loads(line.decode("utf-8"), parse_constant=self.fail)
                 for line in text.split(b"\n")[:-1]]
 
     def run_json(self, *arguments, status=0, **options):
         done = self.run_tavo("--format", "json", *arguments, status=status, **options)
         return self.objects(done.stdout)
-
-
-def children_of(pid):
-    try:
-        text = pathlib.Path(f"/proc/{pid}/task/{pid}/children").read_text()
-    except FileNotFoundError:
-        return []
-    return [int(word) for word in text.split()]
-
-
-def main():
-    if not os.access(TAVO, os.X_OK) or not os.access(MAKE_SONG, os.X_OK):
-        sys.exit("the command or make_song is missing")
-    unittest.main()

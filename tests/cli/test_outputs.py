@@ -1,0 +1,128 @@
+"""Files that the command writes - label tracks, click tracks, pictures: whole or not there."""
+import os
+import signal
+import struct
+import subprocess
+import time
+
+from command_case import TAVO, Case, file_limit, nobody, short_song, standard_song, wav
+
+# What writes which file for song.wav.
+LABELS = (["--format", "labels"], "song.wav.labels.txt")
+PICTURE = (["--plot", "p.svg"], "p.svg")
+CLICK = (["--click", "c.wav"], "c.wav")
+
+
+class Outputs(Case):
+    def setUp(self):
+        super().setUp()
+        self.song = self.put("song.wav")
+
+    def test_beside_each_other_and_only_when_asked(self):
+        before = self.song.read_bytes()
+        self.run_tavo("song.wav")
+        self.assert_only("song.wav")
+        done = self.run_tavo("--plot", "[p,q].svg", *CLICK[0], *LABELS[0], "song.wav")
+        self.assertEqual(done.stdout, b"song.wav.labels.txt\n")
+        self.assert_only("song.wav", "song.wav.labels.txt", "c.wav", "[p,q].svg")
+        self.assertEqual(self.song.read_bytes(), before)
+        mask = os.umask(0)
+        os.umask(mask)
+        for name in ("song.wav.labels.txt", "c.wav", "[p,q].svg"):
+            self.assertEqual((self.folder / name).stat().st_mode & 0o777, 0o666 & ~mask, name)
+        track = (self.folder / "c.wav").read_bytes()
+        self.assertEqual(track[:4] + track[8:12], b"RIFFWAVE")
+        self.assertEqual(struct.unpack("<I", track[40:44])[0], len(track) - 44)
+        self.assertGreater(max(struct.unpack(f"<{(len(track) - 44) // 2}h", track[44:])), 3000)
+
+    def test_labels(self):
+        self.put("song.wav", source=standard_song())
+        for arguments, seconds in (([], 30.0), (["--length", "12"], 12.0)):
+            (result,) = self.run_json(*arguments, "song.wav")
+            self.run_tavo(*LABELS[0], "--force", *arguments, "song.wav")
+            start = result["hl_pos_ms"] / 1000
+            expected = [(start, min(start + seconds, 60.0), "highlight")]
+            expected += [(ms / 1000, ms / 1000, f"beat {i}")
+                         for i, ms in enumerate(result["beats_ms"], 1)]
+            lines = (self.folder / LABELS[1]).read_text().splitlines()
+            for line, (begin, end, name) in zip(lines, expected, strict=True):
+                track = line.split("\t")
+                self.assertEqual(track[2], name)
+                self.assertAlmostEqual(float(track[0]), begin, places=5)
+                self.assertAlmostEqual(float(track[1]), end, places=5)
+
+    def test_what_exists_stays(self):
+        for arguments, name in (LABELS, PICTURE):
+            with self.subTest(name=name):
+                target = self.put(name, b"mine\n")
+                done = self.run_tavo(*arguments, "song.wav", status=1)
+                self.assertIn(b"--force", done.stderr)
+                self.assertEqual((done.stdout, target.read_bytes()), (b"", b"mine\n"))
+                self.run_tavo(*arguments, "--force", "song.wav")
+                self.assertIn(b"highlight", target.read_bytes())
+        self.assert_only("song.wav", LABELS[1], PICTURE[1])
+
+    def test_places_that_cannot_be_written(self):
+        before = self.song.read_bytes()
+        (self.folder / "link.svg").symlink_to("/dev/null")
+        for option, places in (("--click", ["song.wav", ".", "nowhere/c.wav"]),
+                               ("--plot", ["song.wav", "./song.wav", ".", "nowhere/p.svg",
+                                           "link.svg", "/dev/null"])):
+            for place in places:
+                with self.subTest(option=option, place=place):
+                    (result,) = self.run_json("--force", option, place, "song.wav", status=1)
+                    self.assertRegex(result["error"], "click|picture|cannot be written")
+        self.assertEqual(self.song.read_bytes(), before)
+        self.assertTrue((self.folder / "link.svg").is_symlink())
+        self.assert_only("song.wav", "link.svg")
+
+    def test_failures_leave_nothing(self):
+        self.put("silent.wav", wav(seconds=3, sample=bytes(32)))
+        self.put("bad.wav", b"RIFF" * 40)
+        for arguments, name in (LABELS, PICTURE, CLICK):
+            with self.subTest(name=name):
+                for song in ("silent.wav", "bad.wav", "missing.wav"):
+                    self.run_tavo(*arguments, song, status=1)
+                done = self.run_tavo(*arguments, "song.wav", status=1, **file_limit(64))
+                self.assertRegex(done.stderr, b"cannot be written: file too large|not be written "
+                                              b"whole; the disk may be full")
+                self.assertEqual(done.stdout, b"")
+        self.assert_only("song.wav", "silent.wav", "bad.wav")
+
+    def test_label_tracks_in_another_folder(self):
+        self.put("x/song.wav")
+        self.put("y/song.wav", source=short_song(seed=7))
+        out = self.folder / "out"
+        out.mkdir()
+        for _ in range(2):  # the second is refused whichever is done first
+            done = self.run_tavo(*LABELS[0], "--force", "-o", "out", "-j", "2", "x", "y", status=1)
+            self.assertEqual(done.stdout, b"out/song.wav.labels.txt\n")
+            self.assertTrue(done.stderr.startswith(b"tavo: y/song.wav: Its label track would"))
+        self.assertEqual(os.listdir(out), [LABELS[1]])
+        self.assertEqual(os.listdir(self.folder / "x"), ["song.wav"])
+        os.chmod(out, 0o555)
+        done = self.run_tavo(*LABELS[0], "--force", "-o", "out", "x", status=1, **nobody())
+        self.assertIn(b"cannot be written: permission denied", done.stderr)
+
+    def test_a_stop_while_drawing(self):
+        # A stop at any moment: no picture, or all of it. About half of the time is drawing.
+        self.put_hours_of_silence("song.wav", 3)
+        arguments = [TAVO, *PICTURE[0], "--mode", "highlight", "song.wav"]
+        start = time.monotonic()
+        subprocess.run(arguments, cwd=self.folder, check=True, stdout=subprocess.DEVNULL)
+        took = time.monotonic() - start
+        picture = self.folder / "p.svg"
+        whole = picture.read_bytes()
+        for part in (0.5, 0.7, 0.8, 0.9, 0.95):
+            picture.unlink(missing_ok=True)
+            run = subprocess.Popen(arguments, cwd=self.folder, stdout=subprocess.DEVNULL,
+                                   stderr=subprocess.DEVNULL)
+            time.sleep(part * took)
+            run.send_signal(signal.SIGINT)
+            status = run.wait(60)
+            if picture.exists():
+                self.assertEqual(picture.read_bytes(), whole)
+                self.assert_only("song.wav", "p.svg")
+            else:
+                self.assertIn(status, (128 + signal.SIGINT, -signal.SIGINT))
+                self.assert_only("song.wav")
