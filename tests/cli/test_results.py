@@ -14,10 +14,8 @@ def as_single(times):
     return [struct.unpack("f", struct.pack("f", float(t)))[0] for t in times]
 
 
-class Usage(Case):
+class Results(Case):
     def test_wrong_usage(self):
-        self.put("a.wav")
-        self.put("b.wav")
         cases = [
             ([], "name at least one"),
             (["--mode", "all", "a.wav"], "--mode"),
@@ -43,15 +41,10 @@ class Usage(Case):
                 self.assertEqual(done.stdout, b"")
                 self.assertIn(said, done.stderr.decode())
                 self.assertIn("--help", done.stderr.decode())
-        self.assert_only("a.wav", "b.wav")
-
-
-class Formats(Case):
-    def setUp(self):
-        super().setUp()
-        self.put("song.wav", source=standard_song())
+        self.assert_only()
 
     def analyse(self, *arguments):
+        self.put("song.wav", source=standard_song())
         (result,) = self.run_json(*arguments, "song.wav")
         return result
 

@@ -1,4 +1,5 @@
 """Several files at once, workers that die, the user who stops, readers who go away."""
+import contextlib
 import os
 import pty
 import signal
@@ -9,44 +10,17 @@ from pathlib import Path
 from command_case import TAVO, Case, short_song, song, wav
 
 
-def children_of(pid):
-    try:
-        text = Path(f"/proc/{pid}/task/{pid}/children").read_text()
-    except FileNotFoundError:
-        return []
-    return [int(word) for word in text.split()]
-
-
 def open_files(pid):
     """What each descriptor of a process leads to, of those that stay open while we look."""
     found = {}
-    try:
+    with contextlib.suppress(OSError):
         for number in os.listdir(f"/proc/{pid}/fd"):
-            try:
+            with contextlib.suppress(OSError):
                 found[int(number)] = os.readlink(f"/proc/{pid}/fd/{number}")
-            except OSError:
-                pass
-    except OSError:
-        pass
     return found
 
 
-class Order(Case):
-    def test_as_single_runs_in_input_order(self):
-        names = [f"{i}.wav" for i in range(10)]
-        for i, name in enumerate(names):
-            self.put(name, source=song(seconds=40, loud_at=14, seed=i) if i % 4 == 0
-                     else short_song(seed=i))
-        self.put("5.wav", b"RIFF")  # the others go on
-        single = b"".join(self.run_tavo("--format", "json", name, status=int(name == "5.wav")).stdout
-                          for name in names)
-        for jobs in ("1", "2", "4", "32"):
-            with self.subTest(jobs=jobs):
-                done = self.run_tavo("--format", "json", "-j", jobs, *names, status=1)
-                self.assertEqual(done.stdout, single)
-
-
-class Running(Case):
+class Workers(Case):
     def setUp(self):
         super().setUp()
         self.put("a.wav")
@@ -69,18 +43,29 @@ class Running(Case):
         wanted = str(self.folder / name)
         end = time.monotonic() + 60
         while time.monotonic() < end:
-            for child in children_of(process.pid):
+            self.assertIsNone(process.poll(), "the command ended before its time")
+            children = Path(f"/proc/{process.pid}/task/{process.pid}/children").read_text()
+            for child in map(int, children.split()):
                 if wanted in open_files(child).values():
                     return child
-            self.assertIsNone(process.poll(), "the command ended before its time")
         self.fail("no worker opened " + name)
 
     def assert_finished(self, text, *names):
         results = self.objects(text)
         self.assertEqual([(r["file"], r["status"]) for r in results], [(n, "ok") for n in names])
 
+    def test_as_single_runs_in_input_order(self):
+        names = [f"{i}.wav" for i in range(10)]
+        for i, name in enumerate(names):
+            self.put(name, source=short_song(i) if i % 4 else song(seconds=40, seed=i))
+        self.put("5.wav", b"RIFF")  # the others go on
+        single = b"".join(self.run_tavo("--format", "json", name, status=int(name == "5.wav")).stdout
+                          for name in names)
+        for jobs in ("1", "2", "4", "32"):
+            with self.subTest(jobs=jobs):
+                done = self.run_tavo("--format", "json", "-j", jobs, *names, status=1)
+                self.assertEqual(done.stdout, single)
 
-class Deaths(Running):
     def test_a_killed_worker_costs_its_file_only(self):
         names = ["a.wav", "long.wav", "./a.wav", "././a.wav"]
         for jobs in ("1", "2"):
@@ -115,9 +100,7 @@ class Deaths(Running):
             self.assertLess(time.monotonic(), end, "the worker goes on")
             time.sleep(0.05)
 
-
-class Stops(Running):
-    def test_what_is_finished_is_kept(self):
+    def test_a_stop_keeps_what_is_finished(self):
         for number, status in ((signal.SIGINT, 130), (signal.SIGTERM, 143)):
             for send in (os.kill, os.killpg):  # as kill does, as the terminal does
                 with self.subTest(number=number, send=send):
@@ -130,7 +113,7 @@ class Stops(Running):
                     self.assert_finished(out, "a.wav")
                     self.assertIn(b"stopped; 1 of 3 files are done", err)
 
-    def test_finished_files_behind_the_stopped_one_are_kept(self):
+    def test_a_stop_keeps_what_is_finished_behind_another(self):
         process = self.start("-j", "2", "long.wav", "a.wav", "./a.wav", "other.wav")
         self.worker_with(process, "long.wav")
         self.worker_with(process, "other.wav")  # so the other worker's files are done
@@ -139,15 +122,13 @@ class Stops(Running):
         self.assertEqual(process.returncode, 130, err)
         self.assert_finished(out, "a.wav", "./a.wav")
 
-    def test_while_a_list_is_read(self):
+    def test_a_stop_while_a_list_is_read(self):
         process = self.start("-", stdin=subprocess.PIPE)
         time.sleep(0.5)
         process.send_signal(signal.SIGINT)
         self.assertEqual(process.wait(timeout=60), 130)
 
-
-class Readers(Running):
-    def test_gone_during_an_analysis(self):
+    def test_a_reader_gone_during_an_analysis(self):
         process = self.start(*["long.wav"] * 400)
         self.worker_with(process, "long.wav")
         process.stdout.close()
@@ -155,7 +136,7 @@ class Readers(Running):
         self.assertEqual(process.wait(timeout=60), 0)
         self.assertEqual(process.stderr.read(), b"")
 
-    def test_gone_before_the_first_byte(self):
+    def test_a_reader_gone_before_the_first_byte(self):
         reader, writer = os.pipe()
         os.close(reader)
         process = self.start("a.wav", form="csv", stdout=writer)  # which has a head
@@ -171,8 +152,6 @@ class Readers(Running):
                 self.assertEqual(done.returncode, 1)
                 self.assertIn(b"The results cannot be written", done.stderr)
 
-
-class Progress(Running):
     def on_terminal(self, *arguments):
         """What standard error shows on a terminal."""
         control, terminal = pty.openpty()
@@ -180,16 +159,14 @@ class Progress(Running):
                              stdout=subprocess.DEVNULL, stderr=terminal)
         os.close(terminal)
         shown = b""
-        try:
+        with contextlib.suppress(OSError):  # the terminal's other side is closed
             while part := os.read(control, 65536):
                 shown += part
-        except OSError:  # the terminal's other side is closed
-            pass
         os.close(control)
         self.assertEqual(process.wait(timeout=120), 0)
         return shown
 
-    def test_bar_on_a_terminal_only(self):
+    def test_progress_on_a_terminal_only(self):
         started = time.monotonic()
         self.run_tavo("-m", "highlight", "long.wav")
         # Work for about four seconds, however fast this machine and this build are.
