@@ -75,8 +75,7 @@ inline bool enter(const std::string &function, const std::vector<jobject> &passe
     require(this_thread != thread_kind::unknown, function, "thread not attached");
     require(!pending || kAlwaysAllowed.count(function) != 0, function, "exception pending");
     for (const jobject each : passed) {
-        const bool lives = each == nullptr || references.count(each) != 0;
-        require(lives, function, "not a live reference");
+        require(references.count(each) != 0, function, "not a live reference");
     }
     if (succeeds(function)) return true;
     pending = true;
@@ -104,7 +103,10 @@ inline void call_java(jclass of, va_list args) {
     if (array != nullptr) got.beats = references[array].floats;
     now.events.push_back(got);
 
-    const bool throws = !enter("CallStaticVoidMethod", {of, got.object, array});
+    std::vector<jobject> passed = {of};
+    if (got.object != nullptr) passed.push_back(got.object);
+    if (array != nullptr) passed.push_back(array);
+    const bool throws = !enter("CallStaticVoidMethod", passed);
     pending = false;  // the method is still running
     const std::function<void()> action = event_action;
     hold.unlock();

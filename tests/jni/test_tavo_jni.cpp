@@ -44,24 +44,6 @@ constexpr char kNoHost[] = "6: Can't find com/kestu/tavo/Tavo\n";
 constexpr char kNotNotified[] = "6: An exception occurred while notifying an event.\n";
 constexpr char kNotAttached[] = "6: Failed to get the environment using AttachCurrentThread()\n";
 
-void setup(jobject object) {
-    Java_com_kestu_tavo_Tavo_native_1setup(fake_vm::environment(), fake_vm::new_object(), object);
-}
-jint init(const std::string &path) {
-    return Java_com_kestu_tavo_Tavo_init(fake_vm::environment(), fake_vm::new_object(),
-                                         fake_vm::new_string(path), TAVO_MODE_HIGHLIGHT);
-}
-jint analyze() {
-    return Java_com_kestu_tavo_Tavo_analyze(fake_vm::environment(), fake_vm::new_object(), 0, 0, 0);
-}
-jint deinit() {
-    return Java_com_kestu_tavo_Tavo_deinit(fake_vm::environment(), fake_vm::new_object());
-}
-
-void call_back_on_a_thread(TAVO_INFO info) {
-    std::thread([&info] { tavocallback(&info); }).join();
-}
-
 // A song in a file of its own for as long as the tests run.
 const std::string &song_path() {
     static const std::string path = [] {
@@ -72,6 +54,28 @@ const std::string &song_path() {
         return made;
     }();
     return path;
+}
+
+jstring song() {
+    return fake_vm::new_string(song_path());
+}
+
+void setup(jobject object) {
+    Java_com_kestu_tavo_Tavo_native_1setup(fake_vm::environment(), fake_vm::new_object(), object);
+}
+jint init(jstring path = song()) {
+    return Java_com_kestu_tavo_Tavo_init(fake_vm::environment(), fake_vm::new_object(), path,
+                                         TAVO_MODE_HIGHLIGHT);
+}
+jint analyze() {
+    return Java_com_kestu_tavo_Tavo_analyze(fake_vm::environment(), fake_vm::new_object(), 0, 0, 0);
+}
+jint deinit() {
+    return Java_com_kestu_tavo_Tavo_deinit(fake_vm::environment(), fake_vm::new_object());
+}
+
+void call_back_on_a_thread(TAVO_INFO info) {
+    std::thread([&info] { tavocallback(&info); }).join();
 }
 
 void expect_all_given_back() {
@@ -114,6 +118,8 @@ TEST(JniBeforeSetup, EveryCallIsHarmless) {
     EXPECT_EQ(analyze(), 0);
     EXPECT_EQ(deinit(), 0);
     EXPECT_EQ(fake_vm::take_log(), kNoInstance);
+    EXPECT_EQ(init(nullptr), -4);
+    EXPECT_EQ(fake_vm::take_log(), kUnusable);
     EXPECT_EQ(tavo_jni_mutex, nullptr);
     EXPECT_EQ(fake_vm::seen().violations, "");
 }
@@ -125,10 +131,10 @@ TEST_F(Jni, AJobIsOpenedStartedAndEndedOnce) {
         std::this_thread::sleep_for(std::chrono::milliseconds(100));
         started = analyze();
         ended = deinit();
-        opened = init(song_path());
+        opened = init();
     });
-    EXPECT_EQ(init(song_path()), 0);
-    EXPECT_EQ(init(song_path()), kBusy);
+    EXPECT_EQ(init(), 0);
+    EXPECT_EQ(init(), kBusy);
     EXPECT_NE(tavo_jni_mutex, nullptr);
     EXPECT_EQ(analyze(), 0);
     EXPECT_EQ(deinit(), 0);
@@ -186,7 +192,7 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
         fake_vm::reset();
         fake_vm::fail(each.failing, each.nth);
         setup(fake_vm::new_object());
-        EXPECT_EQ(init(song_path()), opens ? 0 : -4);
+        EXPECT_EQ(init(), opens ? 0 : -4);
         if (opens) call_back_on_a_thread(each.info);
         EXPECT_EQ(fake_vm::take_log(), each.log);
         expect_all_given_back();
@@ -204,7 +210,7 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
 
 // From a thread that the machine knows, which stays attached.
 TEST_F(Jni, ARepeatedSetupReplacesItsReferences) {
-    ASSERT_EQ(init(song_path()), 0);
+    ASSERT_EQ(init(), 0);
     TAVO_INFO info = {};
     tavocallback(&info);
     setup(fake_vm::new_object());
@@ -232,7 +238,7 @@ TEST_F(Jni, OfThreadsThatComeTogetherOneOpens) {
     std::vector<jint> results(4);
     std::vector<std::thread> threads;
     for (jint &result : results) {
-        threads.emplace_back([&result] { result = init(song_path()); });
+        threads.emplace_back([&result] { result = init(); });
     }
     for (std::thread &thread : threads) thread.join();
     std::sort(results.begin(), results.end());
@@ -240,7 +246,7 @@ TEST_F(Jni, OfThreadsThatComeTogetherOneOpens) {
 }
 
 TEST_F(Jni, SetupMayRaceWithEvents) {
-    ASSERT_EQ(init(song_path()), 0);
+    ASSERT_EQ(init(), 0);
     std::thread setups([] {
         for (int i = 0; i < 200; ++i) setup(fake_vm::new_object());
     });
