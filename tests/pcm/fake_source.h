@@ -4,15 +4,10 @@
 #define TAVO_TESTS_PCM_FAKE_SOURCE_H
 
 #include <algorithm>
-#include <cstdlib>
-#include <cstring>
-#include <random>
-#include <vector>
 
 #include "core/tavo_ctx.h"
 #include "media_source/mtsrc_ctx.h"
-
-using byte_run = std::vector<uint8_t>;
+#include "tests/pcm/signals.h"
 
 // What one source plays. The test owns it; it outlives the source.
 struct fake_audio {
@@ -86,23 +81,6 @@ inline mtsrc_ctx *open_fake(fake_audio *audio) {
     pthread_mutex_init(&self->ctx.lock, nullptr);
     self->audio = audio;
     return &self->ctx;
-}
-
-// Bytes among which no 200 in a row occur twice.
-inline byte_run noise(int64_t bytes, uint32_t seed) {
-    byte_run run(static_cast<size_t>(bytes));
-    std::mt19937 random(seed);
-    for (auto &value : run) value = static_cast<uint8_t>(random() >> 11);
-    return run;
-}
-
-inline byte_run slice(const byte_run &run, int64_t first, int64_t end) {
-    return {run.begin() + first, run.begin() + end};
-}
-
-inline byte_run operator+(byte_run left, const byte_run &right) {
-    left.insert(left.end(), right.begin(), right.end());
-    return left;
 }
 
 #endif

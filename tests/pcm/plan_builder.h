@@ -44,4 +44,14 @@ inline void lay_plan(TAVO_CTX *ctx, std::vector<fake_audio> *audio,
     ctx->pcm = static_cast<int16_t *>(zeroed(ctx->pcm_bytes));
 }
 
+// Frees the buffers as the caller of construct_decbuf has to.
+inline void drop_buffers(TAVO_CTX *ctx) {
+    for (int32_t i = 0; i < ctx->seg_count; ++i) {
+        free(ctx->seg[i].buf);
+        ctx->seg[i].buf = nullptr;
+    }
+    free(ctx->pcm);
+    ctx->pcm = nullptr;
+}
+
 #endif

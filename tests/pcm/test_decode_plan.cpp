@@ -1,9 +1,6 @@
-#include <gtest/gtest.h>
 #include <unistd.h>
 
 #include <cstdio>
-#include <cstring>
-#include <filesystem>
 #include <string>
 
 #include "pcm/decode.h"
@@ -11,6 +8,9 @@
 #include "tests/support/scripted_codec.h"
 
 namespace {
+
+constexpr char kWav[] = "RIFF\0\0\0\0WAVEfmt ";
+constexpr char kFlac[] = "fLaC            ";
 
 // A file that recognition takes for the format wanted; the scripted codec library does the rest.
 class decode_plan : public testing::Test {
@@ -34,8 +34,6 @@ class decode_plan : public testing::Test {
         fwrite(head, 1, 16, file);
         fclose(file);
     }
-    void write_wav() { write("RIFF\0\0\0\0WAVEfmt "); }
-    void write_flac() { write("fLaC            "); }
 
     int32_t init() {
         tavo_decode_deinit(&ctx);
@@ -46,20 +44,16 @@ class decode_plan : public testing::Test {
         return tavo_decode_init(&ctx, &param);
     }
 
-    std::string path =
-        (std::filesystem::temp_directory_path() / ("tavo_plan_" + std::to_string(getpid())))
-            .string();
+    std::string path = testing::TempDir() + "tavo_plan_" + std::to_string(getpid());
     scripted::script script;
     TAVO_CTX ctx = {};
 };
 
 TEST_F(decode_plan, what_is_refused_and_how_many_segments) {
-    write_wav();
+    write(kWav);
     const struct {
         int64_t duration;
-        int32_t rate;
-        int32_t code;
-        int32_t segments;
+        int32_t rate, code, segments;
         int64_t pcm_bytes;
     } cases[] = {
         {10'000'000, 44100, -3, 0, 0},
@@ -79,9 +73,7 @@ TEST_F(decode_plan, what_is_refused_and_how_many_segments) {
         script.sample_rate = each.rate;
         EXPECT_EQ(init(), each.code);
         if (each.code != 0) {
-            EXPECT_EQ(ctx.seg, nullptr);
-            EXPECT_EQ(ctx.pcm, nullptr);
-            EXPECT_EQ(ext_mutex_mt, nullptr);
+            EXPECT_TRUE(ctx.seg == nullptr && ctx.pcm == nullptr && ext_mutex_mt == nullptr);
             EXPECT_EQ(scripted::live_objects(), 0);
             continue;
         }
@@ -97,38 +89,36 @@ TEST_F(decode_plan, what_is_refused_and_how_many_segments) {
 }
 
 TEST_F(decode_plan, ten_seconds_at_8000_hz) {
-    write_flac();
+    write(kFlac);
     script.duration = 100'000'000;
-    script.seeks = {{0, 1234}};
-    ASSERT_EQ(init(), 0);
-    ASSERT_EQ(ctx.seg_count, 4);
-    EXPECT_EQ(ctx.pcm_bytes, 160'000);
-    for (int64_t i = 0; i < 160'000 / 2; ++i) ASSERT_EQ(ctx.pcm[i], 0);
-    const auto seeks = scripted::calls_of("xflacfd_seek");
-    ASSERT_EQ(seeks.size(), 4U);
-    for (int i = 0; i < 4; ++i) {
-        const TAVO_DECSEG &seg = ctx.seg[i];
-        EXPECT_EQ(seg.index, i);
-        EXPECT_EQ(seg.count, 4);
-        EXPECT_EQ(seg.start, i * 25'000'000);
-        EXPECT_EQ(seg.seek_pos, 1234);
-        EXPECT_EQ(seg.cap, i < 3 ? 72'000 : 40'000);
-        EXPECT_EQ(seg.got, 0);
-        EXPECT_EQ(seg.done, ctx.seg[0].done);
-        EXPECT_EQ(seg.done[i], 0);
-        EXPECT_EQ(seg.mutex, ext_mutex_mt);
-        EXPECT_EQ(seg.cond, ext_cond_mt);
-        EXPECT_EQ(seg.fmt.sample_rate, 8000);
-        EXPECT_EQ(seg.duration, 100'000'000);
-        int64_t asked = -1;
-        memcpy(&asked, seeks[size_t(i)].records.at(0).data(), sizeof(asked));
-        EXPECT_EQ(asked, i * 25'000'000);
+    for (const bool reports : {true, false}) {
+        script.seeks =
+            reports ? std::vector<scripted::seek>{{0, 1234}} : std::vector<scripted::seek>{{1, {}}};
+        ASSERT_EQ(init(), 0);
+        ASSERT_EQ(ctx.seg_count, 4);
+        EXPECT_EQ(ctx.pcm_bytes, 160'000);
+        for (int64_t i = 0; i < 160'000 / 2; ++i) ASSERT_EQ(ctx.pcm[i], 0);
+        const auto seeks = scripted::calls_of("xflacfd_seek");
+        ASSERT_EQ(seeks.size(), 4U);
+        for (int i = 0; i < 4; ++i) {
+            const TAVO_DECSEG &seg = ctx.seg[i];
+            EXPECT_EQ(seg.start, i * 25'000'000);
+            int64_t asked = -1;
+            memcpy(&asked, seeks[size_t(i)].records.at(0).data(), sizeof(asked));
+            EXPECT_EQ(asked, seg.start);
+            // One that fails without a report leaves the position asked for.
+            EXPECT_EQ(seg.seek_pos, reports ? 1234 : seg.start);
+            EXPECT_EQ(seg.cap, i < 3 ? 72'000 : 40'000);
+            EXPECT_EQ(seg.got, 0);
+            EXPECT_EQ(seg.done, ctx.seg[0].done);
+            EXPECT_EQ(seg.duration, 100'000'000);
+        }
     }
 }
 
 TEST_F(decode_plan, sources_that_cannot_be_opened) {
     EXPECT_EQ(init(), -4);  // no such file
-    write_flac();
+    write(kFlac);
     scripted::answer("xflac_init", {1});
     EXPECT_EQ(init(), -4);  // the probe: whatever its own code
     for (int good = 1; good <= 4; ++good) {
@@ -142,46 +132,37 @@ TEST_F(decode_plan, sources_that_cannot_be_opened) {
     }
 }
 
-TEST_F(decode_plan, failed_seek_leaves_the_position_asked_for) {
-    write_flac();
-    script.duration = 100'000'000;
-    script.seeks = {{1, {}}};
-    ASSERT_EQ(init(), 0);
-    EXPECT_EQ(ctx.seg[3].seek_pos, 75'000'000);
-}
-
 TEST_F(decode_plan, file_is_decoded) {
     // WAV is positioned in whole seconds, so the segments begin at 0, 2, 5 and 7 s; the last holds
     // 2.5 s and ends at 9.5 s.
-    write_wav();
-    const byte_run bytes = noise(160'000, 4);
-    std::vector<int16_t> pcm(80'000);
-    memcpy(pcm.data(), bytes.data(), bytes.size());
+    write(kWav);
+    const std::vector<int16_t> pcm = samples_of(noise(160'000, 4));
     script = scripted::song(pcm, 1, 8000, 800);
     script.duration = 100'000'000;
     ASSERT_EQ(init(), 0);
     ASSERT_EQ(DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes), 152'000);
-    EXPECT_EQ(memcmp(ctx.pcm, bytes.data(), 152'000), 0);
+    EXPECT_EQ(memcmp(ctx.pcm, pcm.data(), 152'000), 0);
 }
 
 constexpr int64_t kDuration = 200'000'000;  // units
 
-// Frees the buffers as the caller of construct_decbuf has to.
-void drop_buffers(TAVO_CTX *ctx, int32_t count) {
-    for (int i = 0; i < count; ++i) {
-        free(ctx->seg[i].buf);
-        ctx->seg[i].buf = nullptr;
+// A plan of which only the sources are left, as construct_decbuf expects it.
+class second_plan : public testing::Test {
+ protected:
+    ~second_plan() override { tavo_decode_deinit(&ctx); }
+    int32_t plan(int64_t start, size_t records = 4, int64_t duration = kDuration) {
+        tavo_decode_deinit(&ctx);
+        audio.assign(records, {});
+        lay_plan(&ctx, &audio, std::vector<int64_t>(records, 1), duration);
+        drop_buffers(&ctx);
+        return construct_decbuf(&ctx, start);
     }
-    free(ctx->pcm);
-    ctx->pcm = nullptr;
-}
 
-void lay_bare_plan(TAVO_CTX *ctx, std::vector<fake_audio> *audio) {
-    lay_plan(ctx, audio, {1, 1, 1, 1}, kDuration);
-    drop_buffers(ctx, 4);
-}
+    std::vector<fake_audio> audio;
+    TAVO_CTX ctx = {};
+};
 
-TEST(construct_decbuf, plans_the_rest) {
+TEST_F(second_plan, covers_the_rest) {
     const struct {
         int64_t start;
         int32_t count;
@@ -195,10 +176,7 @@ TEST(construct_decbuf, plans_the_rest) {
     };
     for (const auto &each : cases) {
         SCOPED_TRACE(each.start);
-        std::vector<fake_audio> audio(4);
-        TAVO_CTX ctx;
-        lay_bare_plan(&ctx, &audio);
-        ASSERT_EQ(construct_decbuf(&ctx, each.start), 0);
+        ASSERT_EQ(plan(each.start), 0);
         EXPECT_EQ(ctx.seg_count, each.count);
         EXPECT_EQ(ctx.pcm_bytes, each.pcm_bytes);
         EXPECT_EQ(ctx.seg[each.count - 1].cap, each.last_capacity);
@@ -210,33 +188,22 @@ TEST(construct_decbuf, plans_the_rest) {
             EXPECT_EQ(ctx.seg[i].count, each.count);
             EXPECT_EQ(audio[static_cast<size_t>(i)].seeks.back(), ctx.seg[i].start);
         }
-        tavo_decode_deinit(&ctx);
-        EXPECT_EQ(audio[3].closed, 1);
     }
 }
 
-TEST(construct_decbuf, refuses_what_cannot_be_planned) {
+TEST_F(second_plan, is_refused) {
+    // One unit at 8000 Hz is no whole byte.
     for (const int64_t start : {kDuration, kDuration + 1, kDuration - 1, INT64_MAX, INT64_MIN}) {
         SCOPED_TRACE(start);
-        std::vector<fake_audio> audio(4);
-        TAVO_CTX ctx;
-        lay_bare_plan(&ctx, &audio);
-        // One unit at 8000 Hz is no whole byte.
-        EXPECT_EQ(construct_decbuf(&ctx, start), -2);
+        EXPECT_EQ(plan(start), -2);
         for (int i = 0; i < 4; ++i) EXPECT_EQ(ctx.seg[i].buf, nullptr);
         EXPECT_EQ(ctx.pcm, nullptr);
-        tavo_decode_deinit(&ctx);
     }
 }
 
-TEST(construct_decbuf, never_plans_more_segments_than_records) {
-    std::vector<fake_audio> audio(1);
-    TAVO_CTX ctx;
-    lay_plan(&ctx, &audio, {1}, 50'000'000);
-    drop_buffers(&ctx, 1);
-    ASSERT_EQ(construct_decbuf(&ctx, -10'000'000), 0);  // six seconds
+TEST_F(second_plan, never_has_more_segments_than_records) {
+    ASSERT_EQ(plan(-10'000'000, 1, 50'000'000), 0);  // six seconds
     EXPECT_EQ(ctx.seg_count, 1);
-    tavo_decode_deinit(&ctx);
 }
 
 }  // namespace

@@ -1,35 +1,9 @@
-#include <gtest/gtest.h>
-
-#include <random>
-
-#include "pcm/resample.h"
+#include "tests/pcm/signals.h"
 
 namespace {
 
-std::vector<int16_t> random_samples(size_t count, uint32_t seed) {
-    std::vector<int16_t> samples(count);
-    std::mt19937 random(seed);
-    for (auto &sample : samples) sample = static_cast<int16_t>(random() >> 16);
-    return samples;
-}
-
-// Through dorn_resampler_run, with the 64 cleared bytes behind the samples checked.
-std::vector<double> converted(const std::vector<int16_t> &samples, int32_t rate) {
-    int64_t n = -1;
-    double *out = nullptr;
-    EXPECT_EQ(dorn_resampler_run(samples.data(), static_cast<int64_t>(samples.size() * 2), rate,
-                                 11025, &n, &out),
-              0);
-    for (int64_t i = n; i < n + 8; ++i) EXPECT_EQ(out[i], 0.0);
-    const std::vector<double> result(out, out + n);
-    free(out);
-    EXPECT_EQ(ext_mutex_resample, nullptr);
-    EXPECT_EQ(ext_cond_resample, nullptr);
-    return result;
-}
-
 TEST(resample_block, means_of_whole_blocks) {
-    const std::vector<int16_t> samples = random_samples(1003, 1);
+    const std::vector<int16_t> samples = samples_of(noise(2006, 1));
     for (const int32_t ratio : {1, 2, 3, 4}) {
         SCOPED_TRACE(ratio);
         const std::vector<double> out = converted(samples, ratio * 11025);
@@ -43,13 +17,12 @@ TEST(resample_block, means_of_whole_blocks) {
 }
 
 TEST(resample_block, sums_and_quotients_are_single_precision) {
-    const std::vector<double> out = converted({1, 0, 0, 32767, 32767, 32766}, 33075);
-    ASSERT_EQ(out.size(), 2U);
-    EXPECT_EQ(out[0], 0.3333333432674407958984375);
-    EXPECT_EQ(out[1], 32766.666015625);  // spacing 1/512 here
+    // 32766.666015625: the spacing is 1/512 here
+    EXPECT_EQ(converted({1, 0, 0, 32767, 32767, 32766}, 33075),
+              (std::vector<double>{0.3333333432674407958984375, 32766.666015625}));
 }
 
-// Runs one part on a thread of its own; out[i - first] of the range [first, end).
+// Runs one part on a thread of its own; what it gives for the range [first, end).
 std::vector<double> part_of(const std::vector<int16_t> &in, float ratio, int64_t first,
                             int64_t end) {
     pthread_mutex_t mutex = PTHREAD_MUTEX_INITIALIZER;
@@ -90,33 +63,6 @@ TEST(resample_block, part_by_part) {
     EXPECT_EQ(part_of({}, 1.0F, 0, 1), std::vector<double>{-1});
 }
 
-TEST(resample_block, four_threads_cover_the_output) {
-    // 250 outputs: 62 for each of the first three, 64 for the last.
-    std::vector<int16_t> in(1000);
-    for (size_t i = 0; i < in.size(); ++i) in[i] = static_cast<int16_t>(i);
-    std::vector<double> out(251, -1.0);
-    resamplePcmMonoMT(in.data(), 1000, 44100, out.data(), 250, 11025);
-    for (size_t i = 0; i < 250; ++i) ASSERT_EQ(out[i], 4.0 * double(i) + 1.5) << i;
-    EXPECT_EQ(out[250], -1.0);
-    // Fewer outputs than threads: all of them the last thread's.
-    std::vector<double> few(4, -1.0);
-    resamplePcmMonoMT(in.data(), 12, 44100, few.data(), 3, 11025);
-    EXPECT_EQ(few, (std::vector<double>{1.5, 5.5, 9.5, -1.0}));
-}
-
-TEST(resample_block, empty_and_odd_inputs) {
-    EXPECT_TRUE(converted({}, 44100).empty());
-    EXPECT_TRUE(converted({1, 2, 3}, 44100).empty());
-    int64_t n = -1;
-    double *out = nullptr;
-    const int16_t three[] = {7, 8, 9};
-    ASSERT_EQ(dorn_resampler_run(three, 5, 11025, 11025, &n, &out), 0);  // 5 bytes: 2 samples
-    EXPECT_EQ(n, 2);
-    EXPECT_EQ(out[1], 8.0);
-    EXPECT_EQ(out[2], 0.0);
-    free(out);
-}
-
 TEST(resample_block, positions_beyond_single_precision) {
     // Indexes 2^24 + 0, 1, 2, 3, 4 are + 0, 0, 2, 4, 4 as floats (ties go to the even one).
     constexpr int64_t kExact = 16'777'216;
@@ -124,6 +70,23 @@ TEST(resample_block, positions_beyond_single_precision) {
     for (int16_t i = 0; i < 8; ++i) in[static_cast<size_t>(kExact + i)] = i;
     // [0, 0) empty, [0, 2), [2, 4), [4, 4) empty
     EXPECT_EQ(part_of(in, 1.0F, kExact, kExact + 4), (std::vector<double>{0, 0.5, 2.5, 4}));
+}
+
+TEST(resample_block, short_and_odd_inputs) {
+    EXPECT_TRUE(converted({}, 44100).empty());
+    EXPECT_TRUE(converted({1, 2, 3}, 44100).empty());
+    // Fewer outputs than threads, and a caller who has made no lock.
+    const int16_t in[] = {0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11};
+    std::vector<double> few(4, -1.0);
+    resamplePcmMonoMT(in, 12, 44100, few.data(), 3, 11025);
+    EXPECT_EQ(few, (std::vector<double>{1.5, 5.5, 9.5, -1.0}));
+
+    int64_t n = -1;
+    double *out = nullptr;
+    ASSERT_EQ(dorn_resampler_run(in + 7, 5, 11025, 11025, &n, &out), 0);  // 5 bytes: 2 samples
+    EXPECT_EQ(std::vector<double>(out, out + 3), (std::vector<double>{7, 8, 0}));
+    EXPECT_EQ(n, 2);
+    free(out);
 }
 
 }  // namespace

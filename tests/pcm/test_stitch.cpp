@@ -1,5 +1,3 @@
-#include <gtest/gtest.h>
-
 #include "tests/pcm/plan_builder.h"
 
 namespace {
