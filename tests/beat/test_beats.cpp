@@ -1,21 +1,20 @@
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cmath>
-#include <thread>
+#include <string>
 
-#include "beat/beats.h"
 #include "tests/beat/beat_fixture.h"
 
 namespace {
 
-// Distance of a time to the nearest drum hit, in hops.
-double hops_to_hit(double ms, const std::vector<size_t> &hits) {
-    double nearest = 1e9;
-    for (const size_t hit : hits) {
-        nearest = std::min(nearest, std::fabs(ms / 1000.0 - static_cast<double>(hit) / 11025.0));
-    }
-    return nearest / kHop;
+// Whether a drum is hit within a hop of a time in milliseconds.
+bool near_a_hit(float ms, const std::vector<size_t> &hits) {
+    return std::any_of(hits.begin(), hits.end(), [&](size_t hit) {
+        const double seconds = static_cast<double>(hit) / 11025.0;
+        return std::fabs(static_cast<double>(ms) / 1000.0 - seconds) <= kHop;
+    });
 }
 
 // The tempi of the periods that lie within a frame of a tempo's own.
@@ -43,9 +42,7 @@ TEST(Beats, DrumsOfKnownTempo) {
 
         const std::vector<float> beats = of.beats();
         EXPECT_TRUE(std::is_sorted(beats.begin(), beats.end()));
-        for (const float beat : beats) {
-            EXPECT_LE(hops_to_hit(static_cast<double>(beat), hits), 1.0) << tempo << ": " << beat;
-        }
+        for (const float beat : beats) EXPECT_TRUE(near_a_hit(beat, hits)) << tempo << ": " << beat;
     }
 }
 
@@ -79,75 +76,26 @@ TEST(Beats, RiseForcesABeat) {
 TEST(Beats, StopBeforeTheEnvelope) {
     analysis of(drum_song(120, 10));
     of.ctx.quit = 1;
-    fnamedec = "stopped_analysis.wav";
+    const std::string path = testing::TempDir() + "stopped_" + std::to_string(getpid()) + ".wav";
+    fnamedec = path.c_str();
     EXPECT_EQ(getBeatPosition(&of.ctx), 0);
-    FILE *file = fopen(fnamedec, "rb");
     fnamedec = "";
-    EXPECT_EQ(file, nullptr);
-    if (file != nullptr) fclose(file);
+    EXPECT_NE(unlink(path.c_str()), 0);  // no click track
     EXPECT_EQ(of.ctx.onset->beat_count, 0);
     EXPECT_EQ(of.ctx.onset->bpm, -7);
     EXPECT_EQ(of.ctx.state, kStateRunning);
     EXPECT_EQ(feat_mutex_mt, nullptr);
 }
 
-// A stop from another thread at any moment leaves all of the beats or none.
-TEST(Beats, StopAtAnyMoment) {
-    analysis of(drum_song(120, 20));
-    const int32_t all = getBeatPosition(&of.ctx);
-    for (int delay = 0; delay < 12; ++delay) {
-        of.ctx.state = kStateRunning;
-        store_flag(&of.ctx.quit, 0);
-        std::thread stopper([&] {
-            std::this_thread::sleep_for(std::chrono::milliseconds(delay));
-            store_flag(&of.ctx.quit, 1);
-        });
-        const int32_t count = getBeatPosition(&of.ctx);
-        stopper.join();
-        EXPECT_EQ(count, of.ctx.state == kStateFinished ? all : 0);
-    }
-}
-
-TEST(Beats, SilenceHasNinetyAndNoBeats) {
-    analysis of(std::vector<double>(20 * 11025));
-    EXPECT_EQ(getBeatPosition(&of.ctx), 0);
-    EXPECT_EQ(of.ctx.onset->bpm, 90);
-    EXPECT_EQ(of.ctx.onset->beat_times, nullptr);
-    EXPECT_EQ(of.ctx.state, kStateFinished);
-}
-
-TEST(Beats, TooShortForAnEnvelope) {
-    for (const size_t n : {0u, 1u, 255u, 256u, 257u, 511u, 512u, 767u}) {
-        analysis of(noise(n, 10000.0));
+// Silence, and signals too short for an envelope.
+TEST(Beats, NothingHasNinetyAndNoBeats) {
+    for (const size_t n : {0u, 1u, 255u, 256u, 257u, 511u, 512u, 767u, 20u * 11025u}) {
+        analysis of(n < 768 ? noise(n, 10000.0) : std::vector<double>(n));
         EXPECT_EQ(getBeatPosition(&of.ctx), 0) << n;
         EXPECT_EQ(of.ctx.onset->bpm, 90) << n;
+        EXPECT_EQ(of.ctx.onset->beat_times, nullptr) << n;
         EXPECT_EQ(of.ctx.state, kStateFinished) << n;
     }
     EXPECT_EQ(getBeatPosition(nullptr), 0);
     clearOnsetCtx(nullptr);
-}
-
-// Short, extreme and slow signals, for the checks of a sanitised build; beats lie in the signal.
-TEST(Beats, EveryLengthAndExtreme) {
-    const auto check = [](const std::vector<double> &samples) {
-        analysis of(samples);
-        const int32_t count = getBeatPosition(&of.ctx);
-        EXPECT_EQ(of.ctx.state, kStateFinished);
-        EXPECT_GE(of.ctx.onset->bpm, 30);
-        EXPECT_LE(of.ctx.onset->bpm, 200);
-        const std::vector<float> beats = of.beats();
-        ASSERT_EQ(static_cast<int32_t>(beats.size()), count);
-        EXPECT_TRUE(std::is_sorted(beats.begin(), beats.end()));
-        const double end = static_cast<double>(samples.size()) / 11.025;
-        for (const float beat : beats) EXPECT_TRUE(beat > 0.0f && static_cast<double>(beat) < end);
-    };
-    for (size_t n = 768; n < 16000; n += 509) check(noise(n, 32767.0));
-    check(std::vector<double>(60000, -32768.0));
-    for (double seconds = 1.0; seconds <= 8.0; seconds += 0.31) {
-        check(noise(static_cast<size_t>(seconds * 11025), 32767.0));
-        for (const double tempo : {31.0, 38.0, 46.0, 55.0}) check(drum_song(tempo, seconds));
-    }
-    std::vector<double> square(100000);
-    for (size_t i = 0; i < square.size(); ++i) square[i] = i / 3000 % 2 == 0 ? 32767.0 : -32768.0;
-    check(square);
 }

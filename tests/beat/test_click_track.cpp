@@ -10,17 +10,27 @@
 
 namespace {
 
+using namespace std::string_literals;
+
 constexpr int kBlip = 1102;  // samples, 100 ms
 
-using bytes = std::vector<uint8_t>;
-
-std::string temporary_path() {
-    return testing::TempDir() + "click_" + std::to_string(getpid()) + ".wav";
+// Runs an analysis and gives the file that it writes.
+std::string click_file(analysis *of) {
+    const std::string path = testing::TempDir() + "click_" + std::to_string(getpid()) + ".wav";
+    fnamedec = path.c_str();
+    getBeatPosition(&of->ctx);
+    fnamedec = "";
+    EXPECT_EQ(of->ctx.state, kStateFinished);
+    std::ifstream file(path, std::ios::binary);
+    std::string bytes{std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
+    unlink(path.c_str());
+    return bytes;
 }
 
-bytes read_file(const std::string &path) {
-    std::ifstream file(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
+int sample_at(const std::string &file, size_t i) {
+    int16_t sample = 0;
+    memcpy(&sample, file.data() + 44 + 2 * i, sizeof(sample));
+    return sample;
 }
 
 std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
@@ -29,49 +39,41 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
     return track;
 }
 
-int sample_at(const bytes &file, size_t i) {
-    return static_cast<int16_t>(file[44 + 2 * i] | file[45 + 2 * i] << 8);
-}
-
 }  // namespace
 
 TEST(ClickTrack, Header) {
     const struct {
         uint32_t n;
-        bytes riff, data;
-    } cases[] = {{1000, {0xF4, 0x07, 0, 0}, {0xD0, 0x07, 0, 0}},  // 2036, 2000
-                 {0, {36, 0, 0, 0}, {0, 0, 0, 0}},
-                 {0xFFFFFFFF, {34, 0, 0, 0}, {0xFE, 0xFF, 0xFF, 0xFF}}};  // 32 bits wrap
+        std::string riff, data;
+    } cases[] = {{1000, "\xF4\x07\0\0"s, "\xD0\x07\0\0"s},  // 2036, 2000
+                 {0, "\x24\0\0\0"s, "\0\0\0\0"s},
+                 {0xFFFFFFFF, "\x22\0\0\0"s, "\xFE\xFF\xFF\xFF"s}};  // 32 bits wrap
     for (const auto &c : cases) {
         char buffer[64] = {};
         FILE *stream = fmemopen(buffer, sizeof buffer, "wb");
         EXPECT_EQ(makeWaveHeader(c.n, stream), 1);
         EXPECT_EQ(ftell(stream), 44);
         fclose(stream);
-        bytes expected = {'R', 'I', 'F', 'F'};
-        expected.insert(expected.end(), c.riff.begin(), c.riff.end());
-        const bytes middle = {'W', 'A', 'V', 'E', 'f', 'm',  't',  ' ', 16,  0,    0,
-                              0,   1,   0,   1,   0,   0x11, 0x2B, 0,   0,   0x22, 0x56,
-                              0,   0,   2,   0,   16,  0,    'd',  'a', 't', 'a'};
-        expected.insert(expected.end(), middle.begin(), middle.end());
-        expected.insert(expected.end(), c.data.begin(), c.data.end());
-        EXPECT_EQ(bytes(buffer, buffer + 44), expected);
+        // 16 bytes: PCM, mono, 11025 Hz, 22050 bytes a second, 2 a frame, 16 bits
+        const std::string format =
+            "WAVEfmt \x10\0\0\0\1\0\1\0"s + "\x11\x2B\0\0"s + "\x22\x56\0\0"s + "\2\0\x10\0"s;
+        EXPECT_EQ(std::string(buffer, 44), "RIFF" + c.riff + format + "data" + c.data);
     }
 }
 
 // i e^(-i/110) cos(2 pi 4000 i / 11025) / 160.
 TEST(ClickTrack, BlipIsPlacedAtTheNearestSample) {
     const std::vector<float> track = track_of({1000.04f}, 20000);  // sample 11025.44
-    EXPECT_EQ(track[11024], 0.0f);
-    EXPECT_EQ(track[11025], 0.0f);
-    EXPECT_NEAR(track[11026], -0.0040316, 1e-6);
-    EXPECT_NEAR(track[11027], -0.0018710, 2e-6);
+    const auto blip = track.begin() + 11025;
+    EXPECT_EQ(blip[-1], 0.0f);
+    EXPECT_EQ(blip[0], 0.0f);
+    EXPECT_NEAR(blip[1], -0.0040316, 1e-6);
+    EXPECT_NEAR(blip[2], -0.0018710, 2e-6);
     float top = 0.0f;
-    for (int i = 0; i < kBlip; ++i)
-        top = std::max(top, std::fabs(track[11025 + static_cast<size_t>(i)]));
+    for (int i = 0; i < kBlip; ++i) top = std::max(top, std::fabs(blip[i]));
     EXPECT_NEAR(top, 0.253, 0.002);
-    EXPECT_NE(track[11025 + kBlip - 1], 0.0f);
-    EXPECT_EQ(track[11025 + kBlip], 0.0f);
+    EXPECT_NE(blip[kBlip - 1], 0.0f);
+    EXPECT_EQ(blip[kBlip], 0.0f);
 }
 
 // 50 ms are 551.25 samples: the second blip begins at 1654 and ends the first.
@@ -91,7 +93,7 @@ TEST(ClickTrack, AtTheEnd) {
         int64_t n;
         size_t length;
     } cases[] = {{1103 + kBlip, kBlip},
-                 {1103 + kBlip - 1, kBlip - 2},
+                 {1102 + kBlip, kBlip - 2},
                  {1105, 1},
                  {1104, 0},
                  {1103, 0},
@@ -107,15 +109,9 @@ TEST(ClickTrack, AtTheEnd) {
 }
 
 TEST(ClickTrack, FileHoldsHalfTheSignalAndTheBlips) {
-    const std::string path = temporary_path();
     analysis of(drum_song(120, 12));
-    fnamedec = path.c_str();
-    const int32_t count = getBeatPosition(&of.ctx);
-    fnamedec = "";
-    ASSERT_GT(count, 2);
-    const bytes file = read_file(path);
-    unlink(path.c_str());
-
+    const std::string file = click_file(&of);
+    ASSERT_GT(of.beats().size(), 2u);
     const std::vector<float> track = track_of(of.beats(), of.ctx.ana_len);
     ASSERT_EQ(file.size(), 44 + 2 * of.ana.size());
     for (size_t i = 0; i < of.ana.size(); ++i) {
@@ -127,16 +123,11 @@ TEST(ClickTrack, FileHoldsHalfTheSignalAndTheBlips) {
 // Whatever the length; 1001 and -1001 halve towards zero.
 TEST(ClickTrack, WithoutBeatsHalfTheSignalAlone) {
     for (const size_t n : {size_t{0}, size_t{300}, size_t{11025}}) {
-        const std::string path = temporary_path();
         std::vector<double> samples(n, 1001.0);
         if (n > 0) samples[1] = -1001.0;
         analysis of(samples);
-        fnamedec = path.c_str();
-        EXPECT_EQ(getBeatPosition(&of.ctx), 0);
-        fnamedec = "";
-        EXPECT_EQ(of.ctx.state, kStateFinished);
-        const bytes file = read_file(path);
-        unlink(path.c_str());
+        const std::string file = click_file(&of);
+        EXPECT_TRUE(of.beats().empty());
         ASSERT_EQ(file.size(), 44 + 2 * n);
         for (size_t i = 0; i < n; ++i) ASSERT_EQ(sample_at(file, i), i == 1 ? -500 : 500);
     }
