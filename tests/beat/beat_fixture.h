@@ -88,4 +88,14 @@ inline std::vector<double> drum_song(double bpm, double seconds) {
     return song;
 }
 
+// Ten seconds of a quiet drum, then fourteen of a loud one with hiss.
+inline std::vector<double> rising_song() {
+    std::vector<double> song = drum_song(120, 24);
+    const std::vector<double> hiss = noise(song.size(), 16000.0, 9);
+    for (size_t i = 0; i < song.size(); ++i) {
+        song[i] = i < 10 * 11025 ? 0.05 * song[i] : song[i] + hiss[i];
+    }
+    return song;
+}
+
 #endif

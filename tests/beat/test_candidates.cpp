@@ -95,13 +95,12 @@ TEST(Candidates, GapsThatAreLongEnough) {
     } cases[] = {{120, 129, 2}, {120, 130, 3}, {40, 258, 2}, {40, 259, 3}};
     for (const auto &c : cases) {
         envelope env(1200, c.bpm);
-        const int64_t start = 300;
-        const int64_t middle = c.bpm == 40 ? start + 129 : start + 50;
-        env.peak(start, 20.0);
+        const int64_t middle = c.bpm == 40 ? 429 : 350;
+        env.peak(300, 20.0);
         // Enough plateaus for the slow tempo's longer window (third, eighth largest).
         env.kept_out(middle, 2.0);
         std::fill(env.beat.onset_env + middle + 20, env.beat.onset_env + middle + 29, 10.0);
-        env.peak(start + c.gap, 21.0);
+        env.peak(300 + c.gap, 21.0);
         EXPECT_EQ(env.place().size(), c.beats) << c.bpm << " BPM, gap " << c.gap;
     }
 }

@@ -45,16 +45,8 @@ struct outcome {
     bool refused;
 };
 
-// Of a song with a rise.
 outcome analyse(int refused_allocation = INT32_MAX, int stopping_start = INT32_MAX) {
-    static const std::vector<double> song = [] {
-        std::vector<double> quiet_to_loud = drum_song(120, 14);
-        for (size_t i = 0; i < 5 * 11025; ++i) quiet_to_loud[i] *= 0.01;
-        for (size_t i = 5 * 11025; i < quiet_to_loud.size(); ++i) {
-            quiet_to_loud[i] += i % 2 == 0 ? 9000.0 : -9000.0;
-        }
-        return quiet_to_loud;
-    }();
+    static const std::vector<double> song = rising_song();
     analysis of(song);
     stop_flag = &of.ctx.quit;
     until_refused = refused_allocation;

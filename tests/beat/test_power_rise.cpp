@@ -44,25 +44,33 @@ using samples = std::vector<size_t>;
 
 }  // namespace
 
-// Silence is at the floor of -30.31 dB, sample 0.5 at level 8191, -12.04 dB. P60 is -12.04, the
-// target twice that, level 2048: three of the ten samples around i must be loud (3 * 819).
-TEST(PowerRise, FirstSampleThatReachesTheTarget) {
-    for (const size_t first : {2000u, 3u}) {
-        EXPECT_EQ(rises_of(steps({{10 * kBlock + first, 0.5}})), samples{10 * kBlock + first - 2});
-    }
-}
-
-// Anything below level 1000 counts as -30.31 dB. A step to -28.03 dB (level 1300) is then too low,
-// its limit being -32.03; one to -24.29 dB (2000) is not, and its target lies below the floor.
-TEST(PowerRise, SilenceCountsAsTheFloor) {
-    EXPECT_EQ(rises_of(steps({{10 * kBlock + 2000, sample_of_level(1300)}})), samples{});
-    EXPECT_EQ(rises_of(steps({{10 * kBlock + 2000, sample_of_level(2000)}})), samples{10 * kBlock});
-}
-
-// -23.46 dB before the step is below the limit of -17.75 but above the target of -24.08.
-TEST(PowerRise, BoundarySampleCarriesTheBlockBefore) {
-    const double quiet = sample_of_level(2200);
-    EXPECT_EQ(rises_of(steps({{0, quiet}, {10 * kBlock + 2000, 0.5}})), samples{10 * kBlock});
+TEST(PowerRise, Steps) {
+    constexpr size_t kBegin = 10 * kBlock;
+    const struct {
+        const char *name;
+        std::vector<step> steps;
+        samples rises;
+    } cases[] = {
+        // Silence is at the floor of -30.31 dB, sample 0.5 at level 8191, -12.04 dB. P60 is -12.04,
+        // the target twice that, level 2048: three of the ten samples around i must be loud (3 *
+        // 819).
+        {"in a block", {{kBegin + 2000, 0.5}}, {kBegin + 1998}},
+        {"at a block's start", {{kBegin + 3, 0.5}}, {kBegin + 1}},
+        // Block 0 is never measured and counts as quiet.
+        {"in the second block", {{kBlock + 2000, 0.5}}, {kBlock + 1998}},
+        // Anything below level 1000 counts as the floor. A step to -28.03 dB (level 1300) is then
+        // too low, its limit being -32.03; one to -24.29 dB (2000) is not, and its target lies
+        // below the floor.
+        {"too low", {{kBegin + 2000, sample_of_level(1300)}}, {}},
+        {"just high enough", {{kBegin + 2000, sample_of_level(2000)}}, {kBegin}},
+        // -23.46 dB before the step is below the limit of -17.75 but above the target of -24.08:
+        // the boundary sample carries the block before.
+        {"above the target before", {{0, sample_of_level(2200)}, {kBegin + 2000, 0.5}}, {kBegin}},
+        // Ten samples of -32768 have a mean of 32769, beyond 16 bits. The target is the top, 0 dB,
+        // which only ten loud samples reach.
+        {"saturated", {{kBegin + 2000, -32768.0 / 32767.0}}, {kBegin + 2005}},
+    };
+    for (const auto &c : cases) EXPECT_EQ(rises_of(steps(c.steps)), c.rises) << c.name;
 }
 
 // Loud, quiet for two blocks and loud again, in block 17 or 18 after a rise in block 11: -22 dB
@@ -90,18 +98,6 @@ TEST(PowerRise, NearTheEnd) {
     EXPECT_EQ(rises_of(steps(list, 16 * kBlock + 5)).size(), 1u);
     EXPECT_EQ(rises_of(steps(list, 16 * kBlock + 4)).size(), 0u);  // block 16 is not measured
     EXPECT_EQ(rises_of(steps(list, 16 * kBlock)).size(), 0u);
-}
-
-// Block 0 is never measured and counts as quiet: a song may rise in its second block.
-TEST(PowerRise, InTheSecondBlock) {
-    EXPECT_EQ(rises_of(steps({{kBlock + 2000, 0.5}})), samples{kBlock + 1998});
-}
-
-// Ten samples of -32768 have a mean of 32769, beyond 16 bits. The target is the top, 0 dB, which
-// only ten loud samples reach.
-TEST(PowerRise, LevelSaturates) {
-    EXPECT_EQ(rises_of(steps({{10 * kBlock + 2000, -32768.0 / 32767.0}})),
-              samples{10 * kBlock + 2005});
 }
 
 TEST(PowerRise, ShortAndEven) {

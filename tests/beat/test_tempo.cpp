@@ -48,21 +48,13 @@ TEST(Tempo, TwoPulses) {
     EXPECT_EQ(calc_bpm_acf(x.data(), 4096, kLags, 2584, kHop), 215);
 }
 
+// As in silence, too.
 TEST(Tempo, NoPeriodCountsAsAboveEveryTempo) {
-    std::vector<double> x(64);
-    EXPECT_GT(calc_bpm_acf(x.data(), 64, kLags, 64, kHop), 200);
-    EXPECT_GT(calc_bpm_acf(x.data(), 64, 3, 64, kHop), 200);
-    x[5] = NAN;
-    EXPECT_GT(calc_bpm_acf(x.data(), 64, kLags, 64, kHop), 200);
-    x[5] = INFINITY;
-    EXPECT_GT(calc_bpm_acf(x.data(), 64, kLags, 64, kHop), 200);
-}
-
-// Two clicks 12 frames apart and nothing else: above 200, so 90 is stored.
-TEST(Tempo, AboveTwoHundredIsNinety) {
-    std::vector<double> samples(8 * 11025);
-    samples[20000] = samples[20000 + 12 * 256] = 32767.0;
-    analysis of(samples);
-    getBeatPosition(&of.ctx);
-    EXPECT_EQ(of.ctx.onset->bpm, 90);
+    for (const double odd_one : {0.0, double{NAN}, double{INFINITY}}) {
+        std::vector<double> x(64);
+        x[5] = odd_one;
+        for (const int32_t lags : {kLags, 3}) {
+            EXPECT_GT(calc_bpm_acf(x.data(), 64, lags, 64, kHop), 200) << odd_one;
+        }
+    }
 }
