@@ -1,6 +1,5 @@
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cstdlib>
 #include <vector>
 
@@ -16,12 +15,11 @@ struct RESULT {
     int32_t power_count;
 };
 
-// The PCM is copied to a block of exactly its size.
-RESULT find(const std::vector<int16_t> &pcm, int64_t duration_s, int32_t hl_param) {
-    int16_t *block = static_cast<int16_t *>(malloc(pcm.size() * sizeof(int16_t)));
-    std::copy(pcm.begin(), pcm.end(), block);
+// The PCM is of exactly its size.
+RESULT find(std::vector<int16_t> pcm, int64_t duration_s, int32_t hl_param) {
+    pcm.shrink_to_fit();
     TAVO_CTX ctx = {};
-    ctx.pcm = block;
+    ctx.pcm = pcm.data();
     ctx.pcm_bytes = static_cast<int64_t>(pcm.size() * sizeof(int16_t));
     ctx.fmt.sample_rate = kRate;
     ctx.duration = duration_s * kUnitsPerSecond;
@@ -33,7 +31,6 @@ RESULT find(const std::vector<int16_t> &pcm, int64_t duration_s, int32_t hl_para
     const RESULT first = {start, ctx.hl->power_count};
     EXPECT_EQ(getHLPosition(&ctx), start);  // the envelope is replaced
     clearHighlgihtCtx(ctx.hl);
-    free(block);
     return first;
 }
 
@@ -50,19 +47,15 @@ TEST(Position, CoarseThenFine) {
     EXPECT_EQ(result.power_count, 58);
 }
 
-TEST(Position, ShortOrEmpty) {
+TEST(Position, ShortOrSilent) {
     std::vector<int16_t> pcm;
     EXPECT_EQ(find(pcm, 120, 30).start, 0u);
     add_level(&pcm, 6 * kRate - 1, 0.5);
     const RESULT result = find(pcm, 5, 0);
     EXPECT_EQ(result.start, 0u);
     EXPECT_EQ(result.power_count, 0);
-}
-
-TEST(Position, Silence) {
-    std::vector<int16_t> pcm;
-    add_level(&pcm, 120 * kRate, 0.0);
-    EXPECT_EQ(find(pcm, 120, 30).start, 0u);
+    EXPECT_EQ(find(std::vector<int16_t>(120 * kRate), 120, 30).start, 0u);
+    clearHighlgihtCtx(nullptr);
 }
 
 // The only edge leads to the window at 112 s, the last but one of 120 s, whose tuning would need
@@ -77,10 +70,6 @@ TEST(Position, TheTuningNeverReadsPastThePcm) {
     // largest at 14, and 18 to 19 is the level step after it: 109 s + 7.2 s.
     add_level(&pcm, kRate, 0.04);
     EXPECT_EQ(find(pcm, 200, 0).start, 116200u);
-}
-
-TEST(Position, NoContext) {
-    clearHighlgihtCtx(nullptr);
 }
 
 }  // namespace
