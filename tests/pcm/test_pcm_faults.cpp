@@ -50,17 +50,6 @@ TEST(pcm_faults, comparison) {
     EXPECT_EQ(with_failing(1, [&] { return _compare_decoded(&seg, nullptr, &off); }), -1);
 }
 
-// Lock and condition; the table and its flags need a file, which the trials have.
-TEST(pcm_faults, setup) {
-    const TAVO_PARAM param = {"/nowhere", 0};
-    for (int nth = 1; nth <= 3; ++nth) {
-        TAVO_CTX ctx = {};
-        EXPECT_EQ(with_failing(nth, [&] { return tavo_decode_init(&ctx, &param); }),
-                  nth < 3 ? -2 : -4);
-        EXPECT_EQ(ext_mutex_mt, nullptr);
-    }
-}
-
 TEST(pcm_faults, second_plan) {
     // Four buffers and the PCM.
     for (int nth = 1; nth <= 6; ++nth) {
