@@ -43,6 +43,11 @@ TEST(Peaks, OnlyStrictMaximaInside) {
     EXPECT_EQ(peaks({1, 2}, 3), Indexes{});
     EXPECT_EQ(peaks({}, 0), Indexes{});
     EXPECT_EQ(findsortedNPeaks(nullptr, -5, 1, 0, nullptr), 0);
+    // What lies beside the range would make peaks of its ends.
+    const double wide[] = {0, 9, 1, 5, 1, 9, 0};
+    int32_t out[3];
+    ASSERT_EQ(findPeaks(wide + 1, 5, 0, out), 1);
+    EXPECT_EQ(out[0], 2);
 }
 
 TEST(Peaks, LargestFirstUpToACount) {
