@@ -21,9 +21,6 @@ TEST(BeatCtx, OneSecond) {
     working_context work(samples);
     const TAVO_BEAT_CTX &beat = work.beat;
     ASSERT_TRUE(feat_mutex_mt != nullptr && feat_cond_mt != nullptr);
-    EXPECT_EQ(beat.half_frame, 256);
-    EXPECT_EQ(beat.band_count, 36);
-    EXPECT_EQ(beat.hop_seconds, 0.023219954648526078);
     EXPECT_EQ(beat.frame_times[0], 0.02321995465f);
     EXPECT_EQ(beat.frame_times[41], 0.02321995465f * 42.0f);
     EXPECT_EQ(beat.signal[3], -32768.0 / 32767.0);

@@ -1,6 +1,6 @@
 #include <gtest/gtest.h>
 
-#include <numeric>
+#include <algorithm>
 
 #include "beat/power_rise.h"
 #include "tests/beat/beat_fixture.h"
@@ -52,8 +52,8 @@ TEST(PowerRise, Steps) {
         samples rises;
     } cases[] = {
         // Silence is at the floor of -30.31 dB, sample 0.5 at level 8191, -12.04 dB. P60 is -12.04,
-        // the target twice that, level 2048: three of the ten samples around i must be loud (3 *
-        // 819).
+        // the target twice that, level 2048: three of the ten samples around i, each 819 of the
+        // mean, must be loud.
         {"in a block", {{kBegin + 2000, 0.5}}, {kBegin + 1998}},
         {"at a block's start", {{kBegin + 3, 0.5}}, {kBegin + 1}},
         // Block 0 is never measured and counts as quiet.

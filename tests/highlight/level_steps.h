@@ -6,12 +6,21 @@
 #include <cstdint>
 #include <vector>
 
-// Samples whose mean square, on the scale of full range = 1, is about square, alternating in sign.
-inline void add_level(std::vector<int16_t> *pcm, int64_t samples, double square) {
-    const int16_t level = static_cast<int16_t>(std::lround(32767.0 * std::sqrt(square)));
-    for (int64_t i = 0; i < samples; i++) {
-        pcm->push_back(static_cast<int16_t>(i % 2 == 0 ? level : -level));
+struct LEVEL {
+    int64_t samples;
+    double square;  // about their mean square, on the scale of full range = 1
+};
+
+// Each level in turn, alternating in sign.
+inline std::vector<int16_t> levels(const std::vector<LEVEL> &list) {
+    std::vector<int16_t> pcm;
+    for (const LEVEL &each : list) {
+        const int16_t peak = static_cast<int16_t>(std::lround(32767.0 * std::sqrt(each.square)));
+        for (int64_t i = 0; i < each.samples; i++) {
+            pcm.push_back(static_cast<int16_t>(i % 2 == 0 ? peak : -peak));
+        }
     }
+    return pcm;
 }
 
 #endif

@@ -38,20 +38,15 @@ RESULT find(std::vector<int16_t> pcm, int64_t duration_s, int32_t hl_param) {
 // start 54 s. Of the 27 frames from 51 s on, frame 22 is half, 23 wholly at the loud level from
 // 60.2 s on; the rise is largest at 19, its smallest step leads from 23 to 24: 51 s + 9.2 s.
 TEST(Position, CoarseThenFine) {
-    std::vector<int16_t> pcm;
-    add_level(&pcm, 60 * kRate, 0.04);
-    add_level(&pcm, 40 * kRate, 0.64);
-    add_level(&pcm, 20 * kRate, 0.04);
-    const RESULT result = find(pcm, 120, 0);
+    const RESULT result =
+        find(levels({{60 * kRate, 0.04}, {40 * kRate, 0.64}, {20 * kRate, 0.04}}), 120, 0);
     EXPECT_EQ(result.start, 60200u);
     EXPECT_EQ(result.power_count, 58);
 }
 
 TEST(Position, ShortOrSilent) {
-    std::vector<int16_t> pcm;
-    EXPECT_EQ(find(pcm, 120, 30).start, 0u);
-    add_level(&pcm, 6 * kRate - 1, 0.5);
-    const RESULT result = find(pcm, 5, 0);
+    EXPECT_EQ(find({}, 120, 30).start, 0u);
+    const RESULT result = find(levels({{6 * kRate - 1, 0.5}}), 5, 0);
     EXPECT_EQ(result.start, 0u);
     EXPECT_EQ(result.power_count, 0);
     EXPECT_EQ(find(std::vector<int16_t>(120 * kRate), 120, 30).start, 0u);
@@ -61,15 +56,12 @@ TEST(Position, ShortOrSilent) {
 // The only edge leads to the window at 112 s, the last but one of 120 s, whose tuning would need
 // audio up to 120.6 s: the duration promises it, the PCM does not hold it.
 TEST(Position, TheTuningNeverReadsPastThePcm) {
-    std::vector<int16_t> pcm;
-    add_level(&pcm, 116 * kRate, 0.04);
-    add_level(&pcm, 2 * kRate, 0.64);
-    add_level(&pcm, 2 * kRate, 0.04);
-    EXPECT_EQ(find(pcm, 200, 0).start, 112000u);
+    std::vector<LEVEL> song = {{116 * kRate, 0.04}, {2 * kRate, 0.64}, {2 * kRate, 0.04}};
+    EXPECT_EQ(find(levels(song), 200, 0).start, 112000u);
     // With that audio decoded the same start is tuned: of the frames from 109 s on, the rise is
     // largest at 14, and 18 to 19 is the level step after it: 109 s + 7.2 s.
-    add_level(&pcm, kRate, 0.04);
-    EXPECT_EQ(find(pcm, 200, 0).start, 116200u);
+    song.push_back({kRate, 0.04});
+    EXPECT_EQ(find(levels(song), 200, 0).start, 116200u);
 }
 
 }  // namespace

@@ -48,11 +48,7 @@ TEST(PowerEnvelope, KnownLevels) {
     const std::vector<int16_t> full(800, 32767);
     for (float value : envelope(full, kRate)) EXPECT_EQ(value, 10.0f * log10f(2.0f));
     // Two silent seconds, two at a quarter of the full power, two at full: (0 + 1/4 + 1) / 3.
-    std::vector<int16_t> pcm;
-    add_level(&pcm, 200, 0.0);
-    add_level(&pcm, 200, 0.25);
-    add_level(&pcm, 200, 1.0);
-    const std::vector<float> values = envelope(pcm, kRate);
+    const auto values = envelope(levels({{200, 0.0}, {200, 0.25}, {200, 1.0}}), kRate);
     ASSERT_EQ(values.size(), 1u);
     EXPECT_NEAR(values[0], 10.0 * log10(1.0 + 1.25 / 3.0), 1e-4);
 }

@@ -12,13 +12,12 @@ constexpr uint32_t kDuration = 60;  // seconds
 // Frames are 1.2 s, one every 0.4 s from 3 s before the start: 27 of them over 29 steps of 0.4 s.
 // squares: mean square of each step from the first frame on, the last one repeated.
 std::vector<int16_t> steps(int32_t rate, int64_t silent_ms, const std::vector<double> &squares) {
-    std::vector<int16_t> pcm;
-    add_level(&pcm, silent_ms * rate / 1000, 0.0);
+    std::vector<LEVEL> list = {{silent_ms * rate / 1000, 0.0}};
     const int64_t step = static_cast<int64_t>(0.4 * rate);
     for (size_t k = 0; k < 30; k++) {
-        add_level(&pcm, step, k < squares.size() ? squares[k] : squares.back());
+        list.push_back({step, k < squares.size() ? squares[k] : squares.back()});
     }
-    return pcm;
+    return levels(list);
 }
 
 std::vector<double> silence_then(const std::vector<double> &squares) {
