@@ -9,6 +9,7 @@
 namespace {
 
 std::atomic<int> until_refused{INT32_MAX};  // allocations, with the one that is refused
+std::atomic<int> held{0};                   // blocks that are not yet released
 std::atomic<int> until_stop{INT32_MAX};     // thread starts, with the one at which a stop arrives
 int32_t *stop_flag = nullptr;
 
@@ -16,18 +17,28 @@ bool refuse() {
     return until_refused.fetch_sub(1) == 1;
 }
 
+void *counted(void *memory) {
+    if (memory != nullptr) ++held;
+    return memory;
+}
+
 }  // namespace
 
 extern "C" {
 void *__real_calloc(size_t count, size_t size);
 void *__real_malloc(size_t size);
+void __real_free(void *memory);
 int __real_pthread_create(pthread_t *, const pthread_attr_t *, void *(*)(void *), void *);
 
 void *__wrap_calloc(size_t count, size_t size) {
-    return refuse() ? nullptr : __real_calloc(count, size);
+    return refuse() ? nullptr : counted(__real_calloc(count, size));
 }
 void *__wrap_malloc(size_t size) {
-    return refuse() ? nullptr : __real_malloc(size);
+    return refuse() ? nullptr : counted(__real_malloc(size));
+}
+void __wrap_free(void *memory) {
+    if (memory != nullptr) --held;
+    __real_free(memory);
 }
 int __wrap_pthread_create(pthread_t *thread, const pthread_attr_t *attr, void *(*entry)(void *),
                           void *argument) {
@@ -51,9 +62,11 @@ outcome analyse(int refused_allocation = INT32_MAX, int stopping_start = INT32_M
     stop_flag = &of.ctx.quit;
     until_refused = refused_allocation;
     until_stop = stopping_start;
+    const int before = held;
     EXPECT_EQ(getBeatPosition(&of.ctx), of.ctx.onset->beat_count);
     const bool met = until_refused < 1;
     until_refused = INT32_MAX;
+    EXPECT_EQ(held - before, of.beats().empty() ? 0 : 1) << refused_allocation;
     return {of.beats(), of.ctx.onset->bpm, of.ctx.state, met};
 }
 
