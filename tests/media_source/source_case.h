@@ -13,113 +13,105 @@
 #include "tests/support/scripted_codec.h"
 
 using names = std::vector<std::string>;
+using samples = std::vector<int16_t>;
 
 struct source_row {
     const char *name;
     byte_run file;
-    int32_t tag;                    // codec of the script; 0: the format's own
+    int32_t tag;  // codec of the script; 0: the format's own
+    int32_t codec;
+    int32_t frame_bytes;
+    int32_t channels;             // of the format; 0: the script's
+    std::vector<int32_t> config;  // of the decoder, for 5 channels at 22,050 Hz
+    names libraries;
+    std::string reader;             // what its functions' names begin with
+    std::string decoder;            // likewise; empty: none
     names opens;                    // calls of an open that succeeds
     std::vector<int32_t> failures;  // the code when that call fails; 0: its result is not tested
     names closes;
-    const char *read;
-    const char *decode;
-    const char *reset;
-    const char *seek;
-    int32_t codec;
-    int32_t frame_bytes;
-    int32_t channels;  // of the format, the script's being 2
-    names libraries;
+
+    std::string read() const { return reader + "_get_frm"; }
+    std::string seek() const { return reader + "_seek"; }
+    std::string decode() const { return decoder + "_decode"; }
+    std::string reset() const { return decoder + "_reset"; }
 };
 
+inline byte_run wav_file() {
+    return text("RIFF") + zeros(4) + text("WAVEfmt ");
+}
+
+// A format of frames alone, read and decoded by one library.
+inline source_row elementary_row(const char *name, const byte_run &file, const std::string &library,
+                                 int32_t codec, int32_t frame_bytes, int32_t channels,
+                                 const std::vector<int32_t> &config) {
+    return {name,
+            file,
+            0,
+            codec,
+            frame_bytes,
+            channels,
+            config,
+            {library},
+            library + "fd",
+            library + "d",
+            {library + "_init", library + "fd_create", library + "d_create"},
+            {-255, -7, -255},
+            {library + "fd_delete", library + "d_delete", library + "_deinit"}};
+}
+
+inline source_row mp4_row(const char *name, int32_t tag, const source_row &decoded) {
+    source_row row = decoded;
+    row.name = name;
+    row.file = zeros(4) + text("ftyp") + zeros(8);
+    row.tag = tag;
+    row.libraries = {"xaac", "xmp123"};
+    row.reader = "xmp4fds";
+    row.opens = {"xaac_init",    "xmp123_init",          "xmp4fd_create",
+                 "xmp4fds_open", "xmp4fds_get_info_aud", row.decoder + "_create"};
+    row.failures = {-255, -255, -7, -7, 0, -255};
+    row.closes = {"xmp4fds_close", "xmp4fd_delete", row.decoder + "_delete", "xaac_deinit",
+                  "xmp123_deinit"};
+    return row;
+}
+
 inline const std::vector<source_row> &source_rows() {
+    static const source_row aac = elementary_row("aac", byte_run{0xFF, 0xF1} + zeros(14), "xaac",
+                                                 306, 24576, 2, {1, 2, 2, 0, 3, 22050, 5, 0});
+    static const source_row mpeg =
+        elementary_row("mpeg", layer3_pair(), "xmp123", 305, 19200, 0, {1, 0, 2, 0});
     static const std::vector<source_row> rows = {
-        {"aac",
-         byte_run{0xFF, 0xF1} + zeros(14),
-         0,
-         {"xaac_init", "xaacfd_create", "xaacd_create"},
-         {-255, -7, -255},
-         {"xaacfd_delete", "xaacd_delete", "xaac_deinit"},
-         "xaacfd_get_frm",
-         "xaacd_decode",
-         "xaacd_reset",
-         "xaacfd_seek",
-         306,
-         24576,
-         2,
-         {"xaac"}},
-        {"flac",
-         text("fLaC") + zeros(12),
-         0,
-         {"xflac_init", "xflacfd_create", "xflacd_create"},
-         {-255, -7, -255},
-         {"xflacfd_delete", "xflacd_delete", "xflac_deinit"},
-         "xflacfd_get_frm",
-         "xflacd_decode",
-         "xflacd_reset",
-         "xflacfd_seek",
-         322,
-         131070,
-         2,
-         {"xflac"}},
-        {"mpeg",
-         layer3_pair(),
-         0,
-         {"xmp123_init", "xmp123fd_create", "xmp123d_create"},
-         {-255, -7, -255},
-         {"xmp123fd_delete", "xmp123d_delete", "xmp123_deinit"},
-         "xmp123fd_get_frm",
-         "xmp123d_decode",
-         "xmp123d_reset",
-         "xmp123fd_seek",
-         305,
-         19200,
-         2,
-         {"xmp123"}},
-        {"mp4 with aac",
-         zeros(4) + text("ftyp") + zeros(8),
-         kWexaTagAac,
-         {"xaac_init", "xmp123_init", "xmp4fd_create", "xmp4fds_open", "xmp4fds_get_info_aud",
-          "xaacd_create"},
-         {-255, -255, -7, -7, 0, -255},
-         {"xmp4fds_close", "xmp4fd_delete", "xaacd_delete", "xaac_deinit", "xmp123_deinit"},
-         "xmp4fds_get_frm",
-         "xaacd_decode",
-         "xaacd_reset",
-         "xmp4fds_seek",
-         306,
-         24576,
-         2,
-         {"xaac", "xmp123"}},
-        {"mp4 with mpeg",
-         zeros(4) + text("ftyp") + zeros(8),
-         kWexaTagMpegLayer3,
-         {"xaac_init", "xmp123_init", "xmp4fd_create", "xmp4fds_open", "xmp4fds_get_info_aud",
-          "xmp123d_create"},
-         {-255, -255, -7, -7, 0, -255},
-         {"xmp4fds_close", "xmp4fd_delete", "xmp123d_delete", "xaac_deinit", "xmp123_deinit"},
-         "xmp4fds_get_frm",
-         "xmp123d_decode",
-         "xmp123d_reset",
-         "xmp4fds_seek",
-         305,
-         19200,
-         2,
-         {"xaac", "xmp123"}},
+        aac,
+        mpeg,
+        elementary_row("flac", text("fLaC") + zeros(12), "xflac", 322, 131070, 2, {1, 2, 2, 0}),
+        mp4_row("mp4 with aac", kWexaTagAac, aac),
+        mp4_row("mp4 with mpeg", kWexaTagMpegLayer3, mpeg),
         {"ogg",
          text("OggS") + zeros(12),
          0,
-         {"xvorbis_init", "xoggd_create", "xoggds_open", "xoggds_get_info_aud", "xoggds_get_format",
-          "xoggds_get_format", "xvorbisd_create", "xvorbisd_decode"},
-         {-255, -7, -7, -7, -7, -7, -255, -255},
-         {"xoggds_close", "xoggd_delete", "xvorbisd_delete", "xvorbis_deinit"},
-         "xoggds_get_frm",
-         "xvorbisd_decode",
-         "xvorbisd_reset",
-         "xoggds_seek",
          323,
          16384,
          1,
-         {"xvorbis"}},
+         {1, 1, 2, 0},
+         {"xvorbis"},
+         "xoggds",
+         "xvorbisd",
+         {"xvorbis_init", "xoggd_create", "xoggds_open", "xoggds_get_info_aud", "xoggds_get_format",
+          "xoggds_get_format", "xvorbisd_create", "xvorbisd_decode"},
+         {-255, -7, -7, -7, -7, -7, -255, -255},
+         {"xoggds_close", "xoggd_delete", "xvorbisd_delete", "xvorbis_deinit"}},
+        {"wav",
+         wav_file(),
+         0,
+         2006,
+         16384,
+         0,
+         {},
+         {},
+         "xwavd",
+         "",
+         {"xwavd_create"},
+         {-7},
+         {"xwavd_delete"}},
     };
     return rows;
 }
@@ -133,8 +125,12 @@ inline const source_row &source_row_of(const std::string &name) {
     std::abort();
 }
 
-inline byte_run wav_file() {
-    return text("RIFF") + zeros(4) + text("WAVEfmt ");
+// The record that a call was handed.
+template <typename record>
+record recorded(const scripted::call &call, size_t at) {
+    record value = {};
+    memcpy(&value, call.records.at(at).data(), sizeof(value));
+    return value;
 }
 
 struct SourceTest : testing::Test {
@@ -151,6 +147,15 @@ struct SourceTest : testing::Test {
         EXPECT_EQ(scripted::tag_buffers_left(), 0);
         scripted::reset();
     }
+    template <typename action>
+    void for_each_row(action act) {
+        for (const source_row &row : source_rows()) {
+            SCOPED_TRACE(row.name);
+            act(row);
+            close_source();
+            scripted::forget_calls();
+        }
+    }
     void write(const byte_run &content) const {
         FILE *file = fopen(path.c_str(), "wb");
         ASSERT_NE(file, nullptr);
@@ -164,40 +169,53 @@ struct SourceTest : testing::Test {
         EXPECT_EQ(src != nullptr, err == 0);
         return err;
     }
-    int32_t open_file(const byte_run &content, const scripted::script &what) {
-        write(content);
-        scripted::use(what);
-        return open_path(path);
-    }
     int32_t open_row(const source_row &row, scripted::script what) {
         if (row.tag != 0 && !what.codec) {
             what.codec = row.tag;
         }
-        return open_file(row.file, what);
+        write(row.file);
+        scripted::use(what);
+        return open_path(path);
+    }
+    // Opens a file of these frames; its calls are forgotten.
+    void open_frames(const source_row &row, const std::vector<scripted::frame> &frames,
+                     int32_t channels = 2) {
+        scripted::script what;
+        what.frames = frames;
+        what.channels = channels;
+        ASSERT_EQ(open_row(row, what), 0);
+        scripted::forget_calls();
     }
     void close_source() {
         if (src) {
             EXPECT_EQ(mtsrc_deinit(src), -5);
+            EXPECT_EQ(scripted::live_objects(), 0);
             src = nullptr;
         }
     }
     // The result of one read, with the samples delivered.
-    int32_t read(int32_t bytes, std::vector<int16_t> *samples = nullptr) const {
+    int32_t read(int32_t bytes, samples *into = nullptr) const {
         byte_run data(static_cast<size_t>(bytes) + 2, 0xEE);
         mtsrc_frame frame = {data.data(), -1};
         const int32_t code = mtsrc_getstream(src, bytes, &frame);
         EXPECT_EQ(data.back(), 0xEE);
-        if (samples) {
-            samples->assign(frame.size > 0 ? static_cast<size_t>(frame.size) / 2 : 0, 0);
-            std::copy_n(data.data(), samples->size() * 2,
-                        reinterpret_cast<uint8_t *>(samples->data()));
+        if (into) {
+            into->assign(frame.size > 0 ? static_cast<size_t>(frame.size) / 2 : 0, 0);
+            std::copy_n(data.data(), into->size() * 2, reinterpret_cast<uint8_t *>(into->data()));
         }
         return code;
     }
-    std::vector<int16_t> read_all() const {
-        std::vector<int16_t> samples;
-        EXPECT_EQ(read(1 << 16, &samples), 1);
-        return samples;
+    // All that is left, in pieces of so many bytes.
+    samples read_all(int32_t bytes = 1 << 16) const {
+        samples all;
+        samples piece;
+        int32_t code = 0;
+        while (code == 0) {
+            code = read(bytes, &piece);
+            all.insert(all.end(), piece.begin(), piece.end());
+        }
+        EXPECT_EQ(code, 1);
+        return all;
     }
 };
 

@@ -1,115 +1,78 @@
-#include <iterator>
-
 #include "media_source/wexaaudio.h"
 #include "tests/media_source/source_case.h"
 
 namespace {
 
-// What gives back the object that the call makes: "xaacfd_create" and "xaacfd_delete".
-std::string remover_of(const std::string &maker) {
-    const size_t cut = maker.rfind('_');
-    return maker.substr(0, cut) + (maker.substr(cut) == "_open" ? "_close" : "_delete");
-}
-
-// The calls of an open that fails at the given call: up to it, its own clean-up of what was made,
-// and the frame's close, when only the initialisation is left to undo.
-names failing_opening(const source_row &row, size_t at) {
-    const auto failing = row.opens.begin() + static_cast<std::ptrdiff_t>(at);
-    names made;
-    std::transform(row.opens.begin(), failing, std::back_inserter(made), remover_of);
-    names calls(row.opens.begin(), failing + 1);
-    names deinits;
-    for (const std::string &removal : row.closes) {
-        if (removal.find("_deinit") != std::string::npos) {
-            deinits.push_back(removal);
-        } else if (std::find(made.begin(), made.end(), removal) != made.end()) {
-            calls.push_back(removal);
-        }
-    }
-    const bool initialised = at >= row.libraries.size();
-    for (int times = initialised ? 2 : 1; times > 0; --times) {
-        calls.insert(calls.end(), deinits.begin(), deinits.end());
-    }
-    return calls;
-}
-
 using OpenClose = SourceTest;
 
 TEST_F(OpenClose, CallsRecordsAndOrder) {
-    for (const source_row &row : source_rows()) {
-        SCOPED_TRACE(row.name);
+    for_each_row([&](const source_row &row) {
         scripted::script what;
         what.tags = true;
-        scripted::reset();
+        what.sample_rate = 22050;
+        what.channels = 5;
         ASSERT_EQ(open_row(row, what), 0);
         EXPECT_EQ(scripted::call_names(), row.opens);
         EXPECT_EQ(scripted::tag_buffers_left(), 0);
         EXPECT_EQ(src->codec, row.codec);
         EXPECT_EQ(src->frm_buf_size, row.frame_bytes);
-        EXPECT_EQ(src->format.channels, row.channels);
+        EXPECT_EQ(src->format.sample_rate, 22050);
+        EXPECT_EQ(src->format.channels, row.channels ? row.channels : 5);
         EXPECT_EQ(src->format.bits, 16);
         EXPECT_EQ(src->format.duration, what.duration);
-        // Reader: word and information record zeroed. Records of the other calls likewise.
+        // Reader: the handle's callbacks, word and information record zeroed.
         const scripted::call reader = scripted::calls()[row.libraries.size()];
         EXPECT_EQ(reader.addresses[0], &src->io);
         EXPECT_EQ(reader.records[1], zeros(reader.records[1].size()));
         EXPECT_EQ(reader.records[2], zeros(reader.records[2].size()));
+        if (!row.decoder.empty()) {
+            const byte_run config = scripted::calls_of(row.decoder + "_create")[0].records[0];
+            std::vector<int32_t> words(config.size() / sizeof(int32_t));
+            memcpy(words.data(), config.data(), config.size());
+            EXPECT_EQ(words, row.config);
+        }
         scripted::forget_calls();
         close_source();
         EXPECT_EQ(scripted::call_names(), row.closes);
-        EXPECT_EQ(scripted::live_objects(), 0);
         for (const std::string &library : row.libraries) {
             EXPECT_EQ(scripted::balance(library), 0) << library;
         }
-    }
+    });
 }
 
 TEST_F(OpenClose, EachFailingStepIsCleanedUp) {
-    for (const source_row &row : source_rows()) {
+    for_each_row([&](const source_row &row) {
         for (size_t at = 0; at < row.opens.size(); ++at) {
             const std::string step = row.opens[at];
             if (row.failures[at] == 0) {
                 continue;
             }
-            SCOPED_TRACE(std::string(row.name) + ", " + step + ", call " + std::to_string(at));
-            scripted::reset();
+            SCOPED_TRACE(step + ", call " + std::to_string(at));
             const bool again = at > 0 && row.opens[at - 1] == step;
             scripted::answer(step, again ? std::vector<int32_t>{0, -9} : std::vector<int32_t>{-9});
             scripted::script what;
             what.tags = true;
+            scripted::forget_calls();
             EXPECT_EQ(open_row(row, what), row.failures[at]);
-            EXPECT_EQ(scripted::call_names(), failing_opening(row, at));
             EXPECT_EQ(scripted::live_objects(), 0);
             EXPECT_EQ(scripted::tag_buffers_left(), 0);
+            const names calls = scripted::call_names();
+            const auto count_of = [](const names &in, const std::string &name) {
+                return std::count(in.begin(), in.end(), name);
+            };
+            for (size_t i = 0; i < calls.size(); ++i) {
+                if (i <= at) {
+                    EXPECT_EQ(calls[i], row.opens[i]);
+                } else {
+                    EXPECT_EQ(count_of(row.closes, calls[i]), 1) << calls[i];
+                }
+            }
+            // The open that fails gives back what it initialised, then the frame closes once more.
+            for (const std::string &library : row.libraries) {
+                EXPECT_EQ(count_of(calls, library + "_deinit"), at < row.libraries.size() ? 1 : 2);
+            }
         }
-    }
-}
-
-TEST_F(OpenClose, DecoderConfigurations) {
-    const auto words = [](const source_row &row) {
-        const scripted::call made =
-            scripted::calls_of(
-                row.opens[row.opens.back() == "xvorbisd_decode" ? row.opens.size() - 2
-                                                                : row.opens.size() - 1])
-                .back();
-        std::vector<int32_t> found(made.records[0].size() / 4);
-        memcpy(found.data(), made.records[0].data(), found.size() * 4);
-        return found;
-    };
-    const std::vector<std::vector<int32_t>> expected = {
-        {1, 2, 2, 0, 3, 22050, 5, 0}, {1, 2, 2, 0}, {1, 0, 2, 0},
-        {1, 2, 2, 0, 3, 22050, 5, 0}, {1, 0, 2, 0}, {1, 1, 2, 0}};
-    for (size_t i = 0; i < expected.size(); ++i) {
-        const source_row &row = source_rows()[i];
-        scripted::script what;
-        what.sample_rate = 22050;
-        what.channels = 5;
-        ASSERT_EQ(open_row(row, what), 0);
-        EXPECT_EQ(words(row), expected[i]) << row.name;
-        EXPECT_EQ(src->format.sample_rate, 22050);
-        EXPECT_EQ(src->format.channels, row.codec == 305 ? 5 : row.channels) << row.name;
-        close_source();
-    }
+    });
 }
 
 TEST_F(OpenClose, RatesAndChannelsAccepted) {
@@ -119,16 +82,32 @@ TEST_F(OpenClose, RatesAndChannelsAccepted) {
         int32_t channels;
         int32_t code;
     } const cases[] = {
-        {"aac", 7999, 2, -3},           {"aac", 8000, 2, 0},
-        {"aac", 48000, 2, 0},           {"aac", 48001, 2, -3},
-        {"flac", 7999, 2, -3},          {"flac", 192000, 0, 0},
-        {"flac", 192001, 2, -3},        {"mpeg", 8000, 1, 0},
-        {"mpeg", 48000, 2, 0},          {"mpeg", 48001, 2, -3},
-        {"mpeg", 44100, 0, -3},         {"mpeg", 44100, -1, -3},
-        {"mp4 with aac", 7999, 2, -3},  {"mp4 with aac", 48001, 2, -3},
-        {"mp4 with mpeg", 7999, 2, 0},  {"mp4 with mpeg", 48001, 2, -3},
-        {"mp4 with mpeg", 9000, 0, -3}, {"ogg", 1000, 2, 0},
-        {"ogg", 48000, 2, 0},           {"ogg", 48001, 2, -3},
+        {"aac", 7999, 2, -3},
+        {"aac", 8000, 2, 0},
+        {"aac", 48000, 2, 0},
+        {"aac", 48001, 2, -3},
+        {"flac", 7999, 2, -3},
+        {"flac", 192000, 0, 0},
+        {"flac", 192001, 2, -3},
+        {"mpeg", 8000, 1, 0},
+        {"mpeg", 48000, 2, 0},
+        {"mpeg", 48001, 2, -3},
+        {"mpeg", 44100, 0, -3},
+        {"mpeg", 44100, -1, -3},
+        {"mp4 with aac", 7999, 2, -3},
+        {"mp4 with aac", 48001, 2, -3},
+        {"mp4 with mpeg", 7999, 2, 0},
+        {"mp4 with mpeg", 48001, 2, -3},
+        {"mp4 with mpeg", 9000, 0, -3},
+        {"ogg", 1000, 2, 0},
+        {"ogg", 48000, 2, 0},
+        {"ogg", 48001, 2, -3},
+        {"wav", 8000, 1, 0},
+        {"wav", 48000, 2, 0},
+        {"wav", 48001, 2, -3},
+        {"wav", 96000, 2, -3},
+        {"wav", 44100, 0, -3},
+        {"wav", 44100, -2, -3},
     };
     for (const auto &one : cases) {
         SCOPED_TRACE(std::string(one.row) + " " + std::to_string(one.rate));
@@ -137,7 +116,7 @@ TEST_F(OpenClose, RatesAndChannelsAccepted) {
         what.sample_rate = one.rate;
         what.channels = one.channels;
         what.tags = true;
-        scripted::reset();
+        scripted::forget_calls();
         EXPECT_EQ(open_row(row, what), one.code);
         if (one.code != 0) {  // everything made is given back, then the frame closes once more
             names expected = row.opens;
@@ -152,31 +131,58 @@ TEST_F(OpenClose, RatesAndChannelsAccepted) {
     }
 }
 
+TEST_F(OpenClose, WavOfSixteenBitPcmOnly) {
+    struct {
+        const char *name;
+        int32_t codec;
+        int32_t bits;
+        int32_t created;  // result of making the reader
+    } const cases[] = {{"float", 3, 16, 0},
+                       {"8 bits", kWexaPcm, 8, 0},
+                       {"24 bits", kWexaPcm, 24, 0},
+                       {"no reader and an empty record", 0, 0, -1}};
+    for (const auto &one : cases) {
+        SCOPED_TRACE(one.name);
+        scripted::script what;
+        what.codec = one.codec;
+        what.bits = one.bits;
+        scripted::answer("xwavd_create", {one.created});
+        EXPECT_EQ(open_row(source_row_of("wav"), what), -3);
+        EXPECT_EQ(scripted::live_objects(), 0);
+    }
+}
+
 TEST_F(OpenClose, ContainersChooseTheFirstAudioTrack) {
     for (const char *name : {"mp4 with aac", "ogg"}) {
         SCOPED_TRACE(name);
         const source_row &row = source_row_of(name);
         const bool mp4 = row.codec == 306;
-        const int32_t most = mp4 ? 64 : 16;
+        std::vector<int32_t> no_audio(mp4 ? 64 : 16, 2);
+        std::vector<int32_t> only_last = no_audio;
+        only_last.back() = 1;
+        struct {
+            std::vector<int32_t> kinds;
+            int32_t count;   // that the record tells
+            int32_t chosen;  // -1: none
+        } const cases[] = {
+            {{2, 0, 1, 1}, 4, 2},
+            {{2, 3}, 2, -1},
+            {{2, 1}, 1, -1},
+            // A count beyond the record's room does not lead out of it.
+            {no_audio, 1'000'000'000, -1},
+            {only_last, 1'000'000'000, mp4 ? 63 : 15},
+        };
         scripted::script what;
-        what.kinds = {2, 0, 1, 1};
-        scripted::reset();
-        ASSERT_EQ(open_row(row, what), 0);
-        EXPECT_EQ(scripted::calls_of(mp4 ? "xmp4fds_open" : "xoggds_open").back().number, 2);
-        close_source();
-        what.kinds = {2, 3};
-        EXPECT_EQ(open_row(row, what), -7);
-        what.kinds = {2, 1};
-        what.kind_count = 1;
-        EXPECT_EQ(open_row(row, what), -7);
-        // A count beyond the record's room does not lead out of it.
-        what.kinds.assign(static_cast<size_t>(most), 2);
-        what.kind_count = 1'000'000'000;
-        EXPECT_EQ(open_row(row, what), -7);
-        what.kinds.back() = 1;
-        EXPECT_EQ(open_row(row, what), 0);
-        EXPECT_EQ(scripted::calls_of(mp4 ? "xmp4fds_open" : "xoggds_open").back().number, most - 1);
-        close_source();
+        for (const auto &one : cases) {
+            what.kinds = one.kinds;
+            what.kind_count = one.count;
+            EXPECT_EQ(open_row(row, what), one.chosen < 0 ? -7 : 0);
+            if (one.chosen >= 0) {
+                const auto opened = scripted::calls_of(mp4 ? "xmp4fds_open" : "xoggds_open");
+                EXPECT_EQ(opened.back().number, one.chosen);
+            }
+            close_source();
+        }
         what.codec = 0x54;
         EXPECT_EQ(open_row(row, what), mp4 ? -3 : -7);
     }
@@ -202,14 +208,11 @@ TEST_F(OpenClose, VorbisSetUpDataReachTheDecoder) {
     what.setup = {9, 8, 7, 6, 5};
     ASSERT_EQ(open_row(source_row_of("ogg"), what), 0);
     const scripted::call set_up = scripted::calls_of("xvorbisd_decode").back();
-    wexa_frame frame = {};
-    wexa_output output = {};
-    memcpy(&frame, set_up.records[0].data(), sizeof(frame));
-    memcpy(&output, set_up.records[1].data(), sizeof(output));
+    const auto frame = recorded<wexa_frame>(set_up, 0);
     EXPECT_EQ(frame.bytes, 5);
     EXPECT_EQ(frame.word_20, 0);
     EXPECT_EQ(frame.codec, 323);
-    EXPECT_EQ(output.data, nullptr);
+    EXPECT_EQ(recorded<wexa_output>(set_up, 1).data, nullptr);
     EXPECT_EQ(set_up.records[3], what.setup);
     close_source();
     what.setup_length = -1;
@@ -217,34 +220,25 @@ TEST_F(OpenClose, VorbisSetUpDataReachTheDecoder) {
 }
 
 TEST_F(OpenClose, WithoutAHandleOrAProbeFile) {
-    mtsrc_ctx empty = {};
-    int32_t (*const opens[])(mtsrc_ctx *) = {mtsource_wav_open,  mtsource_aac_open,
-                                             mtsource_flac_open, mtsource_mp123_open,
-                                             mtsource_mp4a_open, mtsource_ogg_open};
-    for (const auto open : opens) {
-        EXPECT_EQ(open(nullptr), -4);
-        EXPECT_EQ(open(&empty), -7);
-    }
-    for (const auto close : {mtsource_wav_close, mtsource_aac_close, mtsource_flac_close,
-                             mtsource_mp123_close, mtsource_mp4a_close, mtsource_ogg_close}) {
-        close(nullptr);
-    }
-    for (const auto reset : {mtsource_wav_reset, mtsource_aac_reset, mtsource_flac_reset,
-                             mtsource_mp123_reset, mtsource_mp4a_reset, mtsource_ogg_reset}) {
-        EXPECT_EQ(reset(nullptr), -4);
-    }
+    for_each_row([&](const source_row &row) {
+        ASSERT_EQ(open_row(row, {}), 0);
+        const mtsrc_ctx format = *src;
+        close_source();
+        scripted::forget_calls();
+        mtsrc_ctx empty = {};
+        mtsrc_frame frame = {};
+        int64_t reached = 0;
+        EXPECT_EQ(format.open(nullptr), -4);
+        EXPECT_EQ(format.open(&empty), -7);
+        format.close(nullptr);
+        EXPECT_EQ(format.get_frm(nullptr, 0, &frame), -4);
+        EXPECT_EQ(format.seek(nullptr, 0, &reached), -4);
+        EXPECT_EQ(format.reset(nullptr), -4);
+        EXPECT_EQ(scripted::call_names(), names{});
+    });
+    mtsrc_ctx no_stream = {};
     int64_t reached = 0;
-    for (const auto seek : {mtsource_wav_seek, mtsource_aac_seek, mtsource_flac_seek,
-                            mtsource_mp123_seek, mtsource_mp4a_seek, mtsource_ogg_seek}) {
-        EXPECT_EQ(seek(nullptr, 0, &reached), -4);
-    }
-    mtsrc_frame frame = {};
-    for (const auto read : {mtsource_wav_get_frm, mtsource_aac_get_frm, mtsource_flac_get_frm,
-                            mtsource_mp123_get_frm, mtsource_mp4a_get_frm, mtsource_ogg_get_frm}) {
-        EXPECT_EQ(read(nullptr, 0, &frame), -4);
-    }
-    EXPECT_EQ(mtsource_mp4a_seek(&empty, 0, &reached), -4);  // no stream
-    EXPECT_EQ(scripted::call_names(), names{});
+    EXPECT_EQ(mtsource_mp4a_seek(&no_stream, 0, &reached), -4);
 }
 
 }  // namespace
