@@ -1,8 +1,12 @@
-// A file in memory behind a callback record that has nothing but what probes may use.
+// Contents of files, and a file without a name that has them.
 #ifndef TAVO_TESTS_MEDIA_SOURCE_MEMORY_FILE_H
 #define TAVO_TESTS_MEDIA_SOURCE_MEMORY_FILE_H
 
+#include <gtest/gtest.h>
+#include <unistd.h>
+
 #include <algorithm>
+#include <cstdio>
 #include <cstring>
 #include <string>
 #include <vector>
@@ -10,41 +14,6 @@
 #include "media_source/mtsrc.h"
 
 using byte_run = std::vector<uint8_t>;
-
-struct memory_file {
-    mtsrc_file file = {-1};
-    byte_run bytes = {};
-    int64_t at = 0;
-};
-
-inline memory_file *behind(mtsrc_file *file) {
-    return reinterpret_cast<memory_file *>(file);
-}
-
-inline mtsrc_io memory_io() {
-    mtsrc_io io = {};
-    io.read = [](mtsrc_file *file, void *buf, int32_t count) -> int64_t {
-        memory_file *of = behind(file);
-        const int64_t left = static_cast<int64_t>(of->bytes.size()) - of->at;
-        const int64_t got = std::clamp<int64_t>(left, 0, count);
-        std::copy_n(of->bytes.data() + (got ? of->at : 0), got, static_cast<uint8_t *>(buf));
-        of->at += got;
-        return got;
-    };
-    io.tell = [](mtsrc_file *file, int64_t *offset) {
-        *offset = behind(file)->at;
-        return 0;
-    };
-    io.seek = [](mtsrc_file *file, const int64_t *offset) {
-        behind(file)->at = *offset;
-        return 0;
-    };
-    io.skip = [](mtsrc_file *file, const int64_t *distance) {
-        behind(file)->at += *distance;
-        return *distance < 1 ? -1 : 0;
-    };
-    return io;
-}
 
 inline byte_run text(const std::string &what) {
     return byte_run(what.begin(), what.end());
@@ -69,6 +38,34 @@ inline byte_run id3(int32_t body) {
 // Two Layer III frame headers at 128 kbit/s and 44,100 Hz, one frame length of 417 bytes apart.
 inline byte_run layer3_pair() {
     return byte_run{0xFF, 0xFB, 0x90, 0} + zeros(413) + byte_run{0xFF, 0xFB, 0x90, 0};
+}
+
+// Opened at an offset.
+struct memory_file {
+    FILE *stream = tmpfile();
+    mtsrc_file file = {fileno(stream)};
+
+    explicit memory_file(const byte_run &content, int64_t offset = 0) {
+        fwrite(content.data(), 1, content.size(), stream);
+        fflush(stream);
+        mtsrc_file_seek(&file, &offset);
+    }
+    ~memory_file() { fclose(stream); }
+    int64_t at() {
+        int64_t offset = -1;
+        EXPECT_EQ(mtsrc_file_tell(&file, &offset), 0);
+        return offset;
+    }
+};
+
+// Only what probes may use.
+inline mtsrc_io probe_io() {
+    mtsrc_io io = {};
+    io.read = mtsrc_file_read;
+    io.tell = mtsrc_file_tell;
+    io.seek = mtsrc_file_seek;
+    io.skip = mtsrc_file_skip;
+    return io;
 }
 
 #endif

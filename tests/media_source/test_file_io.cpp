@@ -1,4 +1,3 @@
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -69,37 +68,12 @@ TEST_F(FileIo, SeekSkipTellAndSize) {
     EXPECT_EQ(mtsrc_file_size(file, &length), 0);
     EXPECT_EQ(length, 10);
     EXPECT_EQ(at(), 8);
-}
-
-TEST_F(FileIo, OffsetsBeyondFourGibibytes) {
-    make("");
-    const int64_t far = 5'000'000'000;
-    ASSERT_EQ(mtsrc_file_seek(file, &far), 0);
-    ASSERT_EQ(mtsrc_file_write(file, "x", 1), 1);
-    int64_t length = 0;
+    const int64_t far = 5'000'000'000;  // more than 32 bits hold
+    EXPECT_EQ(mtsrc_file_seek(file, &far), 0);
+    EXPECT_EQ(mtsrc_file_write(file, "x", 1), 1);
     EXPECT_EQ(mtsrc_file_size(file, &length), 0);
     EXPECT_EQ(length, far + 1);
     EXPECT_EQ(at(), far + 1);
-}
-
-TEST_F(FileIo, ThePathFdDuplicatesTheDescriptorAtItsStart) {
-    make("0123456789");
-    const int fd = open(path.c_str(), O_RDONLY);
-    ASSERT_GE(fd, 0);
-    ASSERT_EQ(lseek(fd, 7, SEEK_SET), 7);
-    std::string name = "fd";
-    mtsrc_io other = {};
-    other.path = name.data();
-    other.fd = fd;
-    mtsrc_file *twin = mtsrc_file_open(&other, 0);
-    ASSERT_NE(twin, nullptr);
-    EXPECT_NE(twin->fd, fd);
-    char first = 0;
-    EXPECT_EQ(mtsrc_file_read(twin, &first, 1), 1);
-    EXPECT_EQ(first, '0');
-    EXPECT_EQ(mtsrc_file_close(twin), 0);
-    EXPECT_EQ(close(fd), 0);
-    EXPECT_EQ(mtsrc_file_open(&other, 0), nullptr);  // now a closed descriptor
 }
 
 TEST_F(FileIo, AHandleWithoutADescriptorFails) {

@@ -7,13 +7,11 @@ namespace {
 constexpr int64_t kBefore = 5;  // bytes before the content: recognition starts at any offset
 
 int32_t type_of(const byte_run &content) {
-    const mtsrc_io io = memory_io();
-    memory_file memory;
-    memory.bytes = zeros(kBefore) + content;
-    memory.at = kBefore;
+    const mtsrc_io io = probe_io();
+    memory_file file(zeros(kBefore) + content, kBefore);
     int32_t type = -1;
-    EXPECT_EQ(mtsrc_get_file_type(&io, &memory.file, &type), 0);
-    EXPECT_EQ(memory.at, kBefore);
+    EXPECT_EQ(mtsrc_get_file_type(&io, &file.file, &type), 0);
+    EXPECT_EQ(file.at(), kBefore);
     return type;
 }
 
@@ -78,31 +76,30 @@ TEST(Recognise, TheTagsLengthIsFourGroupsOfSevenBits) {
 }
 
 TEST(Recognise, AHeadThatCannotBeReadWholeIsAFailure) {
-    const mtsrc_io io = memory_io();
-    memory_file memory;
-    memory.bytes = zeros(15);
-    int32_t type = 77;
-    EXPECT_EQ(mtsrc_get_file_type(&io, &memory.file, &type), -6);
-    EXPECT_EQ(type, 77);
-    mtsrc_io broken = memory_io();
-    broken.tell = [](mtsrc_file *, int64_t *) { return -1; };
-    memory.bytes = kAsf;
-    memory.at = 0;
-    EXPECT_EQ(mtsrc_get_file_type(&broken, &memory.file, &type), -6);
-    broken = memory_io();
-    broken.seek = [](mtsrc_file *, const int64_t *) { return -1; };
-    EXPECT_EQ(mtsrc_get_file_type(&broken, &memory.file, &type), -6);
+    mtsrc_io no_tell = probe_io();
+    no_tell.tell = [](mtsrc_file *, int64_t *) { return -1; };
+    mtsrc_io no_seek = probe_io();
+    no_seek.seek = [](mtsrc_file *, const int64_t *) { return -1; };
+    const struct {
+        mtsrc_io io;
+        byte_run content;
+    } cases[] = {{probe_io(), zeros(15)}, {no_tell, kAsf}, {no_seek, kAsf}};
+    for (const auto &one : cases) {
+        memory_file file(one.content);
+        int32_t type = 77;
+        EXPECT_EQ(mtsrc_get_file_type(&one.io, &file.file, &type), -6);
+        EXPECT_EQ(type, 77);
+    }
 }
 
 TEST(Recognise, AFailedSkipAsksTheNextProbe) {
-    mtsrc_io io = memory_io();
+    mtsrc_io io = probe_io();
     io.skip = [](mtsrc_file *, const int64_t *) { return -1; };
-    memory_file memory;
-    memory.bytes = id3(20) + text("fLaC") + zeros(20);
+    memory_file file(id3(20) + text("fLaC") + zeros(20));
     int32_t type = 0;
-    EXPECT_EQ(mtsrc_get_file_type(&io, &memory.file, &type), 0);
+    EXPECT_EQ(mtsrc_get_file_type(&io, &file.file, &type), 0);
     EXPECT_EQ(type, 2199);
-    EXPECT_EQ(memory.at, 0);
+    EXPECT_EQ(file.at(), 0);
 }
 
 }  // namespace
