@@ -28,10 +28,6 @@ void for_each_tag(wexa_tags *tags, void (*act)(void **, int *), int *count) {
     act(&tags->last, count);
 }
 
-const frame *next_frame(object *of) {
-    return of->place < of->what->frames.size() ? &of->what->frames[of->place] : nullptr;
-}
-
 const frame *find(const wexa_frame *of) {
     label mark;
     if (!of->data || of->bytes < static_cast<int32_t>(sizeof(mark))) {
@@ -43,6 +39,34 @@ const frame *find(const wexa_frame *of) {
         return nullptr;
     }
     return &w().scripts[mark.script]->frames[mark.index];
+}
+
+int64_t start_of(const script &what, size_t index) {
+    const int64_t start = what.frames[index].start;
+    return start < 0 ? static_cast<int64_t>(index) : start;
+}
+
+// "xaacfd" of "xaacfd_create".
+std::string kind_of_call() {
+    const std::string &name = w().calls.back().name;
+    return name.substr(0, name.find('_'));
+}
+
+void fault(const std::string &what) {
+    w().faults.push_back(w().calls.back().name + ": " + what);
+}
+
+object *checked(void *handle, const std::string &kind) {
+    auto *of = static_cast<object *>(handle);
+    if (!w().alive.count(of)) {
+        fault("no such object");
+        return nullptr;
+    }
+    if (of->kind != kind) {
+        fault("object of kind " + of->kind);
+        return nullptr;
+    }
+    return of;
 }
 
 }  // namespace
@@ -63,60 +87,64 @@ wexa_tags *make_tags(const script &what) {
     return tags;
 }
 
-int32_t take(const std::string &name, int32_t otherwise) {
-    auto found = w().answers.find(name);
-    if (found == w().answers.end() || found->second.empty()) {
-        return told(name, "result", otherwise);
-    }
-    const int32_t result = found->second.front();
-    found->second.pop_front();
-    return told(name, "result", result);
-}
-
-call &note(const char *name, void *of, int32_t result) {
+lock called(const char *name) {
+    lock held(w().lock);
     if (w().tamper) {
         w().calls.clear();
     }
     w().calls.emplace_back();
-    call &made = w().calls.back();
-    made.name = name;
-    made.object = of;
-    made.result = result;
-    return made;
+    w().calls.back().name = name;
+    return held;
 }
 
-object *checked(const char *name, void *handle, const char *kind) {
-    auto *of = static_cast<object *>(handle);
-    if (!w().alive.count(of)) {
-        w().faults.push_back(std::string(name) + ": no such object");
-        return nullptr;
+int32_t take(int32_t otherwise) {
+    std::deque<int32_t> &answers = w().answers[w().calls.back().name];
+    if (!answers.empty()) {
+        otherwise = answers.front();
+        answers.pop_front();
     }
-    if (of->kind != kind) {
-        w().faults.push_back(std::string(name) + ": object of kind " + of->kind);
-        return nullptr;
-    }
-    return of;
+    return told("result", otherwise);
 }
 
-object *make(const char *kind, size_t script_number) {
+object *checked(void *handle) {
+    return checked(handle, kind_of_call());
+}
+
+object *make(size_t script_number) {
+    if (take(0) != 0) {
+        return nullptr;
+    }
     auto *made = new object;
-    made->kind = kind;
+    made->kind = kind_of_call();
     made->script_number = script_number;
-    made->what =
-        w().scripts.empty() ? std::make_shared<const script>() : w().scripts[script_number];
+    made->what = w().scripts[script_number];
     w().alive.insert(made);
     return made;
 }
 
-void destroy(const char *name, void *handle, const char *kind) {
-    guard held(w().lock);
-    note(name, handle, 0);
-    object *of = checked(name, handle, kind);
+object *make() {
+    return make(w().scripts.size() - 1);
+}
+
+object *open_stream(void *handle, int32_t index) {
+    w().calls.back().number = index;
+    const std::string kind = kind_of_call();  // the demuxer's and an s
+    object *demux = checked(handle, kind.substr(0, kind.size() - 1));
+    object *made = demux ? make(demux->script_number) : nullptr;
+    if (made) {
+        made->parent = demux;
+        ++demux->streams;
+    }
+    return made;
+}
+
+void destroy(void *handle) {
+    object *of = checked(handle);
     if (!of) {
         return;
     }
     if (of->streams != 0) {
-        w().faults.push_back(std::string(name) + ": its stream is still open");
+        fault("its stream is still open");
     }
     if (of->parent && w().alive.count(of->parent)) {
         --of->parent->streams;
@@ -125,44 +153,37 @@ void destroy(const char *name, void *handle, const char *kind) {
     delete of;
 }
 
-int32_t init(const char *name, const char *library) {
-    guard held(w().lock);
-    const int32_t result = take(name, 0);
-    note(name, nullptr, result);
-    if (result == 0) {
-        ++w().balance[library];
-    }
+int32_t init() {
+    const int32_t result = take(0);
+    w().balance[kind_of_call()] += result == 0;
     return result;
 }
 
-void deinit(const char *name, const char *library) {
-    guard held(w().lock);
-    note(name, nullptr, 0);
-    --w().balance[library];
+void deinit() {
+    --w().balance[kind_of_call()];
 }
 
-int32_t get_frm(const char *name, const char *kind, void *handle, void *buf, int32_t size,
-                int32_t *bytes, int64_t *first, int64_t *second) {
-    guard held(w().lock);
-    call &noted = note(name, handle, 0);
-    noted.number = size;
-    object *of = checked(name, handle, kind);
+int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_t *first,
+                   int64_t *second) {
+    w().calls.back().number = size;
+    object *of = checked(handle);
     if (!of) {
-        return noted.result = -1;
+        return -1;
     }
     if (of->kind == "xflacfd") {
         w().flac_flag = w().flac_flag && of->state[kFlacReaderFlag] == 1;
         of->state[kFlacReaderFlag] = 0;
     }
-    const frame *now = next_frame(of);
-    noted.result = take(name, now ? now->result : 1);
+    const std::vector<frame> &frames = of->what->frames;
+    const frame *now = of->place < frames.size() ? &frames[of->place] : nullptr;
+    const int32_t result = take(now ? now->result : 1);
     if (!now) {  // an end that is hidden is an empty frame
-        *bytes = told(name, "bytes", 0);
-        return noted.result;
+        *bytes = told("bytes", 0);
+        return result;
     }
     const size_t index = of->place++;
-    if (noted.result != 0) {
-        return noted.result;
+    if (result != 0) {
+        return result;
     }
     label mark;
     mark.script = static_cast<uint32_t>(of->script_number);
@@ -171,109 +192,74 @@ int32_t get_frm(const char *name, const char *kind, void *handle, void *buf, int
     const void *from = wav ? static_cast<const void *>(now->pcm.data()) : &mark;
     const size_t length = wav ? now->pcm.size() * 2 : sizeof(mark);
     if (size < 0 || length > static_cast<size_t>(size)) {
-        w().faults.push_back(std::string(name) + ": the buffer is too short");
-        return noted.result = -1;
+        fault("the buffer is too short");
+        return -1;
     }
     if (length > 0) {
         memcpy(buf, from, length);
     }
-    *bytes = told(name, "bytes", now->read_bytes.value_or(static_cast<int32_t>(length)));
-    *first = told(name, "first", now->start < 0 ? static_cast<int64_t>(index) : now->start);
+    *bytes = told("bytes", now->read_bytes.value_or(static_cast<int32_t>(length)));
+    *first = told("first", start_of(*of->what, index));
     *second = 0;
     return 0;
 }
 
-int32_t move(const char *name, const char *kind, void *handle, const int64_t *position,
-             int64_t *reached, int32_t flags) {
-    guard held(w().lock);
-    call &noted = note(name, handle, 0);
-    noted.number = flags;
-    hand(noted, position);
-    object *of = checked(name, handle, kind);
+int32_t move(void *handle, int64_t position, int64_t *reached, int32_t flags) {
+    w().calls.back().number = flags;
+    object *of = checked(handle);
     if (!of) {
-        return noted.result = -1;
+        return -1;
     }
-    const int32_t failure = take(name, 0);
+    const int32_t failure = take(0);
     const script &what = *of->what;
     if (of->seeks < what.seeks.size()) {
-        const seek &told = what.seeks[of->seeks++];
-        if (told.reached) {
-            *reached = *told.reached;
-        }
-        return noted.result = failure ? failure : told.result;
+        const seek &answer = what.seeks[of->seeks++];
+        *reached = answer.reached.value_or(*reached);
+        return failure ? failure : answer.result;
     }
     if (failure) {
-        return noted.result = failure;
+        return failure;
     }
-    const int64_t wanted = of->kind == "xwavd" ? *position * 10'000'000 : *position;
+    const int64_t wanted = of->kind == "xwavd" ? position * 10'000'000 : position;
     of->place = 0;
     *reached = 0;
     for (size_t i = 0; i < what.frames.size(); ++i) {
-        const int64_t start =
-            what.frames[i].start < 0 ? static_cast<int64_t>(i) : what.frames[i].start;
-        if (start <= wanted) {
+        if (start_of(what, i) <= wanted) {
             of->place = i;
-            *reached = start;
+            *reached = start_of(what, i);
         }
     }
-    *reached = told(name, "reached", *reached);
+    *reached = told("reached", *reached);
     return 0;
 }
 
-int32_t decode(const char *name, const char *kind, void *handle, const wexa_frame *what,
-               wexa_output *output, wexa_status *status) {
-    guard held(w().lock);
-    call &noted = note(name, handle, 0);
-    hand(noted, what);
-    hand(noted, output);
-    hand(noted, status);
+int32_t decode(void *handle, const wexa_frame *what, wexa_output *output, wexa_status *status) {
     if (what->data && what->bytes > 0) {
         const auto *bytes = static_cast<const uint8_t *>(what->data);
-        noted.records.emplace_back(bytes, bytes + what->bytes);
+        w().calls.back().records.emplace_back(bytes, bytes + what->bytes);
     }
-    if (!checked(name, handle, kind)) {
-        return noted.result = -1;
+    if (!checked(handle)) {
+        return -1;
     }
     const frame *now = find(what);
     if (!now) {  // the Vorbis set-up data, or a frame cut short by read_bytes
         status->produced = 0;
-        return noted.result = take(name, output->data ? -1 : 0);
+        return take(output->data ? -1 : 0);
     }
-    noted.result = take(name, now->decode);
-    if (noted.result != 0) {
-        return noted.result;
+    const int32_t result = take(now->decode);
+    if (result != 0) {
+        return result;
     }
-    status->produced = told(name, "produced", now->produced);
-    output->bytes =
-        told(name, "bytes", now->bytes.value_or(static_cast<int32_t>(now->pcm.size() * 2)));
+    status->produced = told("produced", now->produced);
+    output->bytes = told("bytes", now->bytes.value_or(static_cast<int32_t>(now->pcm.size() * 2)));
     if (!now->pcm.empty()) {
         memcpy(output->data, now->pcm.data(), now->pcm.size() * 2);
     }
     return 0;
 }
 
-void decoder_reset(const char *name, const char *kind, void *handle) {
-    guard held(w().lock);
-    note(name, handle, 0);
-    checked(name, handle, kind);
-}
-
-void *open_stream(const char *name, const char *kind, void *handle, const char *demux_kind,
-                  int32_t index) {
-    guard held(w().lock);
-    object *demux = checked(name, handle, demux_kind);
-    const int32_t failure = demux ? take(name, 0) : -1;
-    object *made = failure ? nullptr : make(kind, demux->script_number);
-    if (made) {
-        made->parent = demux;
-        ++demux->streams;
-    }
-    note(name, made, failure).number = index;
-    return made;
-}
-
 void reset() {
-    guard held(w().lock);
+    const lock held(w().lock);
     for (wexa_tags *tags : w().tags) {
         free(tags);
     }
@@ -282,9 +268,7 @@ void reset() {
     }
     w().tags.clear();
     w().alive.clear();
-    w().scripts.clear();
-    w().current = 0;
-    w().by_path.clear();
+    w().scripts = {std::make_shared<const script>()};
     w().answers.clear();
     w().calls.clear();
     w().balance.clear();
@@ -294,34 +278,27 @@ void reset() {
 }
 
 void tamper(tampering with) {
-    guard held(w().lock);
+    const lock held(w().lock);
     w().tamper = with;
 }
 
 void use(const script &what) {
-    guard held(w().lock);
+    const lock held(w().lock);
     w().scripts.push_back(std::make_shared<const script>(what));
-    w().current = w().scripts.size() - 1;
-}
-
-void use(const std::string &path, const script &what) {
-    guard held(w().lock);
-    w().scripts.push_back(std::make_shared<const script>(what));
-    w().by_path[path] = w().scripts.size() - 1;
 }
 
 void answer(const std::string &name, const std::vector<int32_t> &results) {
-    guard held(w().lock);
+    const lock held(w().lock);
     w().answers[name].assign(results.begin(), results.end());
 }
 
 std::vector<call> calls() {
-    guard held(w().lock);
+    const lock held(w().lock);
     return w().calls;
 }
 
 std::vector<call> calls_of(const std::string &name) {
-    guard held(w().lock);
+    const lock held(w().lock);
     std::vector<call> found;
     for (const call &one : w().calls) {
         if (one.name == name) {
@@ -332,7 +309,7 @@ std::vector<call> calls_of(const std::string &name) {
 }
 
 std::vector<std::string> call_names() {
-    guard held(w().lock);
+    const lock held(w().lock);
     std::vector<std::string> names;
     for (const call &one : w().calls) {
         names.push_back(one.name);
@@ -341,22 +318,22 @@ std::vector<std::string> call_names() {
 }
 
 void forget_calls() {
-    guard held(w().lock);
+    const lock held(w().lock);
     w().calls.clear();
 }
 
 int live_objects() {
-    guard held(w().lock);
+    const lock held(w().lock);
     return static_cast<int>(w().alive.size());
 }
 
 int balance(const std::string &library) {
-    guard held(w().lock);
+    const lock held(w().lock);
     return w().balance[library];
 }
 
 int tag_buffers_left() {
-    guard held(w().lock);
+    const lock held(w().lock);
     int count = 0;
     for (wexa_tags *tags : w().tags) {
         for_each_tag(
@@ -366,12 +343,12 @@ int tag_buffers_left() {
 }
 
 std::vector<std::string> faults() {
-    guard held(w().lock);
+    const lock held(w().lock);
     return w().faults;
 }
 
 bool flac_flag_always_set() {
-    guard held(w().lock);
+    const lock held(w().lock);
     return w().flac_flag;
 }
 

@@ -55,11 +55,7 @@ struct script {
 //   decode: frame, output, status, then the compressed bytes; xaacd_info: information, frame
 struct call {
     std::string name;
-    void *object = nullptr;  // first argument, or the object made
-    int32_t result = 0;
-    // get_frm: size; seek: flags; xmp4fds_open, xoggds_open: index; xoggds_get_format: 1 with a
-    // buffer
-    int32_t number = 0;
+    int32_t number = 0;  // get_frm: size; seek: flags; xmp4fds_open, xoggds_open: index
     std::vector<std::vector<uint8_t>> records = {};
     std::vector<const void *> addresses = {};  // of the same records
 };
@@ -78,9 +74,8 @@ void tamper(tampering with);
 // Forgets scripts, calls and answers. To be called before each case, with no object alive.
 void reset();
 
-// The script of readers created from now on; with a path, of those for this path only.
+// The script of readers created from now on.
 void use(const script &what);
-void use(const std::string &path, const script &what);
 
 // The next call of the function gives this result (a function that creates gives null for any but
 // 0), the next again the one after.

@@ -4,196 +4,204 @@
 
 #include "tests/support/scripted_objects.h"
 
+using scripted::called;
+using scripted::make;
 using scripted::script;
 using scripted::told;
 
+namespace {
+
+const script &latest() {
+    return *scripted::w().scripts.back();
+}
+
+template <typename info>
+void describe(info *to) {
+    to->duration = told("duration", latest().duration);
+    to->tags = scripted::make_tags(latest());
+}
+
+template <typename info>
+void list_streams(info *to, int32_t *count) {
+    const std::vector<int32_t> &kinds = latest().kinds;
+    *count = told("count", latest().kind_count.value_or(static_cast<int32_t>(kinds.size())));
+    for (size_t i = 0; i < kinds.size() && i < std::size(to->kind); ++i) {
+        to->kind[i] = told("kind", kinds[i]);
+    }
+    describe(to);
+}
+
+}  // namespace
+
 extern "C" {
 
+// The functions that the formats share in shape, under their own names.
+#define SCRIPTED_READ(function)                                                             \
+    int32_t function(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first, \
+                     int64_t *second) {                                                     \
+        const auto held = called(__func__);                                                 \
+        return scripted::read_frame(reader, buf, size, bytes, first, second);               \
+    }
+#define SCRIPTED_SEEK(function)                                                 \
+    int32_t function(void *reader, const int64_t *position, int64_t *reached) { \
+        const auto held = called(__func__, position);                           \
+        return scripted::move(reader, *position, reached, 0);                   \
+    }
+#define SCRIPTED_SEEK_WITH_FLAGS(function)                                                     \
+    int32_t function(void *reader, const int64_t *position, int64_t *reached, int32_t flags) { \
+        const auto held = called(__func__, position);                                          \
+        return scripted::move(reader, *position, reached, flags);                              \
+    }
+#define SCRIPTED_REMOVAL(function)          \
+    void function(void *object) {           \
+        const auto held = called(__func__); \
+        scripted::destroy(object);          \
+    }
+#define SCRIPTED_DECODER(library, decoder, config_record)                            \
+    int32_t library##_init(void) {                                                   \
+        const auto held = called(__func__);                                          \
+        return scripted::init();                                                     \
+    }                                                                                \
+    void library##_deinit(void) {                                                    \
+        const auto held = called(__func__);                                          \
+        scripted::deinit();                                                          \
+    }                                                                                \
+    void *decoder##_create(const config_record *config, void *) {                    \
+        const auto held = called(__func__, config);                                  \
+        return make();                                                               \
+    }                                                                                \
+    int32_t decoder##_decode(void *of, const wexa_frame *frame, wexa_output *output, \
+                             wexa_status *status) {                                  \
+        const auto held = called(__func__, frame, output, status);                   \
+        return scripted::decode(of, frame, output, status);                          \
+    }                                                                                \
+    void decoder##_reset(void *of) {                                                 \
+        const auto held = called(__func__);                                          \
+        scripted::checked(of);                                                       \
+    }                                                                                \
+    SCRIPTED_REMOVAL(decoder##_delete)
+
+SCRIPTED_DECODER(xaac, xaacd, xaac_config)
+SCRIPTED_DECODER(xflac, xflacd, wexa_config)
+SCRIPTED_DECODER(xmp123, xmp123d, wexa_config)
+SCRIPTED_DECODER(xvorbis, xvorbisd, wexa_config)
+
+SCRIPTED_READ(xwavd_get_frm)
+SCRIPTED_READ(xaacfd_get_frm)
+SCRIPTED_READ(xflacfd_get_frm)
+SCRIPTED_READ(xmp123fd_get_frm)
+SCRIPTED_READ(xmp4fds_get_frm)
+SCRIPTED_READ(xoggds_get_frm)
+
+SCRIPTED_SEEK_WITH_FLAGS(xwavd_seek)
+SCRIPTED_SEEK(xaacfd_seek)
+SCRIPTED_SEEK(xflacfd_seek)
+SCRIPTED_SEEK(xmp123fd_seek)
+SCRIPTED_SEEK_WITH_FLAGS(xmp4fds_seek)
+SCRIPTED_SEEK_WITH_FLAGS(xoggds_seek)
+
+SCRIPTED_REMOVAL(xwavd_delete)
+SCRIPTED_REMOVAL(xaacfd_delete)
+SCRIPTED_REMOVAL(xflacfd_delete)
+SCRIPTED_REMOVAL(xmp123fd_delete)
+SCRIPTED_REMOVAL(xmp4fds_close)
+SCRIPTED_REMOVAL(xmp4fd_delete)
+SCRIPTED_REMOVAL(xoggds_close)
+SCRIPTED_REMOVAL(xoggd_delete)
+
+// The record is filled also when the answer is a failure.
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t *word) {
-    return scripted::create("xwavd_create", "xwavd", io, word, info,
-                            [](const script &what, xwav_info *to, const char *name) {
-                                to->codec = told(name, "codec", what.codec.value_or(kWexaPcm));
-                                to->sample_rate = told(name, "rate", what.sample_rate);
-                                to->bits = told(name, "bits", what.bits);
-                                to->channels = told(name, "channels", what.channels);
-                                to->duration = told(name, "duration", what.duration);
-                            });
+    const auto held = called(__func__, io, word, info);
+    void *made = make();
+    info->codec = told("codec", latest().codec.value_or(kWexaPcm));
+    info->sample_rate = told("rate", latest().sample_rate);
+    info->bits = told("bits", latest().bits);
+    info->channels = told("channels", latest().channels);
+    info->duration = told("duration", latest().duration);
+    return made;
 }
-int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
-                      int64_t *second) {
-    return scripted::get_frm("xwavd_get_frm", "xwavd", reader, buf, size, bytes, first, second);
-}
-int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32_t flags) {
-    return scripted::move("xwavd_seek", "xwavd", reader, seconds, reached, flags);
-}
-void xwavd_delete(void *reader) {
-    scripted::destroy("xwavd_delete", reader, "xwavd");
-}
-
-// The functions that the elementary formats share in shape, under their own names.
-#define SCRIPTED_READER(format)                                                                   \
-    int32_t x##format##fd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes,          \
-                                  int64_t *first, int64_t *second) {                              \
-        return scripted::get_frm("x" #format "fd_get_frm", "x" #format "fd", reader, buf, size,   \
-                                 bytes, first, second);                                           \
-    }                                                                                             \
-    int32_t x##format##fd_seek(void *reader, const int64_t *position, int64_t *reached) {         \
-        return scripted::move("x" #format "fd_seek", "x" #format "fd", reader, position, reached, \
-                              0);                                                                 \
-    }                                                                                             \
-    void x##format##fd_delete(void *reader) {                                                     \
-        scripted::destroy("x" #format "fd_delete", reader, "x" #format "fd");                     \
-    }
-
-#define SCRIPTED_DECODER(format, config_record)                                                  \
-    int32_t x##format##_init(void) {                                                             \
-        return scripted::init("x" #format "_init", "x" #format);                                 \
-    }                                                                                            \
-    void x##format##_deinit(void) {                                                              \
-        scripted::deinit("x" #format "_deinit", "x" #format);                                    \
-    }                                                                                            \
-    void *x##format##d_create(const config_record *config, void *) {                             \
-        return scripted::create_decoder("x" #format "d_create", "x" #format "d", config);        \
-    }                                                                                            \
-    int32_t x##format##d_decode(void *decoder, const wexa_frame *frame, wexa_output *output,     \
-                                wexa_status *status) {                                           \
-        return scripted::decode("x" #format "d_decode", "x" #format "d", decoder, frame, output, \
-                                status);                                                         \
-    }                                                                                            \
-    void x##format##d_reset(void *decoder) {                                                     \
-        scripted::decoder_reset("x" #format "d_reset", "x" #format "d", decoder);                \
-    }                                                                                            \
-    void x##format##d_delete(void *decoder) {                                                    \
-        scripted::destroy("x" #format "d_delete", decoder, "x" #format "d");                     \
-    }
-
-#define SCRIPTED_STREAM(format)                                                                   \
-    void x##format##ds_close(void *stream) {                                                      \
-        scripted::destroy("x" #format "ds_close", stream, "x" #format "ds");                      \
-    }                                                                                             \
-    int32_t x##format##ds_get_frm(void *stream, void *buf, int32_t size, int32_t *bytes,          \
-                                  int64_t *first, int64_t *second) {                              \
-        return scripted::get_frm("x" #format "ds_get_frm", "x" #format "ds", stream, buf, size,   \
-                                 bytes, first, second);                                           \
-    }                                                                                             \
-    int32_t x##format##ds_seek(void *stream, const int64_t *position, int64_t *reached,           \
-                               int32_t flags) {                                                   \
-        return scripted::move("x" #format "ds_seek", "x" #format "ds", stream, position, reached, \
-                              flags);                                                             \
-    }
-
-SCRIPTED_READER(aac)
-SCRIPTED_READER(flac)
-SCRIPTED_READER(mp123)
-SCRIPTED_DECODER(aac, xaac_config)
-SCRIPTED_DECODER(flac, wexa_config)
-SCRIPTED_DECODER(mp123, wexa_config)
-SCRIPTED_DECODER(vorbis, wexa_config)
-SCRIPTED_STREAM(mp4f)
-SCRIPTED_STREAM(ogg)
 
 void *xaacfd_create(const mtsrc_io *io, int64_t *word, xaac_info *info, void *) {
-    return scripted::create("xaacfd_create", "xaacfd", io, word, info,
-                            [](const script &what, xaac_info *to, const char *name) {
-                                to->sample_rate = told(name, "rate", what.sample_rate);
-                                to->channels = told(name, "channels", what.channels);
-                                to->duration = told(name, "duration", what.duration);
-                                to->tags = scripted::make_tags(what);
-                            });
+    const auto held = called(__func__, io, word, info);
+    void *made = make();
+    info->sample_rate = told("rate", latest().sample_rate);
+    info->channels = told("channels", latest().channels);
+    describe(info);
+    return made;
 }
 int32_t xaacd_info(void *decoder, const wexa_frame *frame, xaac_stream_info *info) {
-    const wexa_frame handed = *frame;
-    const int32_t result =
-        scripted::stream_info("xaacd_info", "xaacd", decoder, info,
-                              [](const script &what, xaac_stream_info *to, const char *name) {
-                                  to->word_0 = 1;
-                                  to->sample_rate = told(name, "rate", what.sample_rate);
-                              });
-    scripted::guard held(scripted::w().lock);
-    scripted::hand(scripted::w().calls.back(), &handed);
+    const auto held = called(__func__, info, frame);
+    const int32_t result = scripted::take(0);
+    if (const scripted::object *of = scripted::checked(decoder)) {
+        info->word_0 = 1;
+        info->sample_rate = told("rate", of->what->sample_rate);
+    }
     return result;
 }
+
 void *xflacfd_create(const mtsrc_io *io, int64_t *word, xflac_info *info, void *) {
-    return scripted::create("xflacfd_create", "xflacfd", io, word, info,
-                            [](const script &what, xflac_info *to, const char *name) {
-                                to->sample_rate = told(name, "rate", what.sample_rate);
-                                to->duration = told(name, "duration", what.duration);
-                                to->tags = scripted::make_tags(what);
-                            });
+    const auto held = called(__func__, io, word, info);
+    void *made = make();
+    info->sample_rate = told("rate", latest().sample_rate);
+    describe(info);
+    return made;
 }
+
 void *xmp123fd_create(const mtsrc_io *io, int64_t *word, xmp123_info *info, void *) {
-    return scripted::create("xmp123fd_create", "xmp123fd", io, word, info,
-                            [](const script &what, xmp123_info *to, const char *name) {
-                                to->sample_rate = told(name, "rate", what.sample_rate);
-                                to->channels = told(name, "channels", what.channels);
-                                to->duration = told(name, "duration", what.duration);
-                                to->tags = scripted::make_tags(what);
-                            });
+    const auto held = called(__func__, io, word, info);
+    void *made = make();
+    info->sample_rate = told("rate", latest().sample_rate);
+    info->channels = told("channels", latest().channels);
+    describe(info);
+    return made;
 }
 
 void *xmp4fd_create(const mtsrc_io *io, int32_t *word, xmp4_info *info, void *) {
-    return scripted::create(
-        "xmp4fd_create", "xmp4fd", io, word, info,
-        [](const script &what, xmp4_info *to, const char *name) {
-            to->track_count = told(
-                name, "count", what.kind_count.value_or(static_cast<int32_t>(what.kinds.size())));
-            for (size_t i = 0; i < what.kinds.size() && i < kMp4Tracks; ++i) {
-                to->kind[i] = told(name, "kind", what.kinds[i]);
-            }
-            to->duration = told(name, "duration", what.duration);
-            to->tags = scripted::make_tags(what);
-        });
-}
-void xmp4fd_delete(void *demux) {
-    scripted::destroy("xmp4fd_delete", demux, "xmp4fd");
+    const auto held = called(__func__, io, word, info);
+    void *made = make();
+    list_streams(info, &info->track_count);
+    return made;
 }
 void *xmp4fds_open(void *demux, int32_t track, void *) {
-    return scripted::open_stream("xmp4fds_open", "xmp4fds", demux, "xmp4fd", track);
+    const auto held = called(__func__);
+    return scripted::open_stream(demux, track);
 }
 int32_t xmp4fds_get_info_aud(void *stream, xmp4_track *track) {
-    return scripted::stream_info("xmp4fds_get_info_aud", "xmp4fds", stream, track,
-                                 [](const script &what, xmp4_track *to, const char *name) {
-                                     to->format_tag =
-                                         told(name, "codec", what.codec.value_or(kWexaTagAac));
-                                     to->sample_rate = told(name, "rate", what.sample_rate);
-                                     to->channels = told(name, "channels", what.channels);
-                                 });
+    const auto held = called(__func__, track);
+    const int32_t result = scripted::take(0);
+    if (const scripted::object *of = scripted::checked(stream)) {
+        track->format_tag = told("codec", of->what->codec.value_or(kWexaTagAac));
+        track->sample_rate = told("rate", of->what->sample_rate);
+        track->channels = told("channels", of->what->channels);
+    }
+    return result;
 }
 
 void *xoggd_create(const mtsrc_io *io, int64_t *word, xogg_info *info, void *) {
-    return scripted::create(
-        "xoggd_create", "xoggd", io, word, info,
-        [](const script &what, xogg_info *to, const char *name) {
-            to->stream_count = told(
-                name, "count", what.kind_count.value_or(static_cast<int32_t>(what.kinds.size())));
-            for (size_t i = 0; i < what.kinds.size() && i < kOggStreams; ++i) {
-                to->kind[i] = told(name, "kind", what.kinds[i]);
-            }
-            to->duration = told(name, "duration", what.duration);
-            to->tags = scripted::make_tags(what);
-        });
-}
-void xoggd_delete(void *demux) {
-    scripted::destroy("xoggd_delete", demux, "xoggd");
+    const auto held = called(__func__, io, word, info);
+    void *made = make();
+    list_streams(info, &info->stream_count);
+    return made;
 }
 void *xoggds_open(void *demux, int32_t index, void *) {
-    return scripted::open_stream("xoggds_open", "xoggds", demux, "xoggd", index);
+    const auto held = called(__func__);
+    return scripted::open_stream(demux, index);
 }
 int32_t xoggds_get_info_aud(void *stream, xogg_stream *info) {
-    return scripted::stream_info("xoggds_get_info_aud", "xoggds", stream, info,
-                                 [](const script &what, xogg_stream *to, const char *name) {
-                                     to->codec = told(name, "codec", what.codec.value_or(323));
-                                     to->sample_rate = told(name, "rate", what.sample_rate);
-                                 });
+    const auto held = called(__func__, info);
+    const int32_t result = scripted::take(0);
+    if (const scripted::object *of = scripted::checked(stream)) {
+        info->codec = told("codec", of->what->codec.value_or(323));
+        info->sample_rate = told("rate", of->what->sample_rate);
+    }
+    return result;
 }
 int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
-    scripted::guard held(scripted::w().lock);
-    scripted::call &noted =
-        scripted::note("xoggds_get_format", stream, scripted::take("xoggds_get_format", 0));
-    noted.number = buf ? 1 : 0;
-    const scripted::object *of = scripted::checked("xoggds_get_format", stream, "xoggds");
-    if (!of || noted.result != 0) {
-        return noted.result = noted.result ? noted.result : -1;
+    const auto held = called(__func__);
+    const int32_t result = scripted::take(0);
+    const scripted::object *of = scripted::checked(stream);
+    if (!of || result != 0) {
+        return result ? result : -1;
     }
     const std::vector<uint8_t> &setup = of->what->setup;
     int32_t reported = of->what->setup_length.value_or(static_cast<int32_t>(setup.size()));
@@ -201,7 +209,7 @@ int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
         reported = std::clamp(*length, 0, static_cast<int32_t>(setup.size()));
         memcpy(buf, setup.data(), static_cast<size_t>(reported));
     }
-    *length = told("xoggds_get_format", "length", reported);
+    *length = told("length", reported);
     return 0;
 }
 }

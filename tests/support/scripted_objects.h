@@ -1,4 +1,5 @@
-// The objects behind the scripted codec library's handles, for its own two units.
+// The objects behind the scripted codec library's handles, for its own two units. All but called
+// run within a call of the library: between called and the end of what it returned.
 #ifndef TAVO_TESTS_SUPPORT_SCRIPTED_OBJECTS_H
 #define TAVO_TESTS_SUPPORT_SCRIPTED_OBJECTS_H
 
@@ -15,9 +16,9 @@ namespace scripted {
 // What the handles point to. state comes first: the FLAC source writes into its reader's.
 struct object {
     uint8_t state[4096] = {};
-    std::string kind = {};
-    std::shared_ptr<const script> what = {};
+    std::string kind = {};  // what the names of its functions begin with
     size_t script_number = 0;
+    std::shared_ptr<const script> what = {};
     size_t place = 0;  // next frame
     size_t seeks = 0;  // answers given
     object *parent = nullptr;
@@ -25,97 +26,66 @@ struct object {
 };
 
 struct world {
-    std::mutex lock;
-    std::vector<std::shared_ptr<const script>> scripts;
-    size_t current = 0;
-    std::map<std::string, size_t> by_path;
-    std::map<std::string, std::deque<int32_t>> answers;
-    std::vector<call> calls;
-    std::set<object *> alive;
-    std::map<std::string, int> balance;
-    std::vector<wexa_tags *> tags;
-    std::vector<std::string> faults;
+    std::mutex lock = {};
+    std::vector<std::shared_ptr<const script>> scripts = {std::make_shared<const script>()};
+    std::map<std::string, std::deque<int32_t>> answers = {};
+    std::vector<call> calls = {};
+    std::set<object *> alive = {};
+    std::map<std::string, int> balance = {};
+    std::vector<wexa_tags *> tags = {};
+    std::vector<std::string> faults = {};
     bool flac_flag = true;
     tampering tamper = nullptr;
 };
 
 world &w();
 
-using guard = std::lock_guard<std::mutex>;
+using lock = std::unique_lock<std::mutex>;
+
+lock called(const char *name);
+
+template <typename record>
+void hand(const record *what) {
+    const auto *bytes = reinterpret_cast<const uint8_t *>(what);
+    w().calls.back().addresses.push_back(what);
+    w().calls.back().records.emplace_back(bytes, bytes + (what ? sizeof(record) : 0));
+}
+
+// Notes a call with the records handed over.
+template <typename... record>
+lock called(const char *name, const record *...records) {
+    lock held = called(name);
+    (hand(records), ...);
+    return held;
+}
+
+// What the call hands back for a value of that name.
+template <typename number>
+number told(const char *value, number truth) {
+    const tampering tamper = w().tamper;
+    return tamper ? static_cast<number>(tamper(w().calls.back().name, value, truth)) : truth;
+}
+
+// The call's result: the next answer laid down for its function, else the other value.
+int32_t take(int32_t otherwise);
+
+// The object behind the handle when it is alive and the function's own; else null and a fault.
+object *checked(void *handle);
+
+// A new object of the function's kind, null when the call's result is a failure.
+object *make(size_t script_number);
+object *make();  // with the latest script
+object *open_stream(void *demux, int32_t index);
+void destroy(void *handle);
 
 wexa_tags *make_tags(const script &what);
 
-// What the function hands back for a value of that name.
-template <typename number>
-number told(const std::string &function, const char *value, number truth) {
-    return w().tamper ? static_cast<number>(w().tamper(function, value, truth)) : truth;
-}
-
-// The next answer laid down for the function, else the other value.
-int32_t take(const std::string &name, int32_t otherwise);
-call &note(const char *name, void *of, int32_t result);
-object *checked(const char *name, void *handle, const char *kind);
-object *make(const char *kind, size_t script_number);
-void destroy(const char *name, void *handle, const char *kind);
-int32_t init(const char *name, const char *library);
-void deinit(const char *name, const char *library);
-int32_t get_frm(const char *name, const char *kind, void *handle, void *buf, int32_t size,
-                int32_t *bytes, int64_t *first, int64_t *second);
-int32_t move(const char *name, const char *kind, void *handle, const int64_t *position,
-             int64_t *reached, int32_t flags);
-int32_t decode(const char *name, const char *kind, void *handle, const wexa_frame *what,
-               wexa_output *output, wexa_status *status);
-void decoder_reset(const char *name, const char *kind, void *handle);
-void *open_stream(const char *name, const char *kind, void *handle, const char *demux_kind,
-                  int32_t index);
-
-template <typename record>
-void hand(call &to, const record *what) {
-    to.addresses.push_back(what);
-    to.records.emplace_back();
-    if (what) {
-        const auto *bytes = reinterpret_cast<const uint8_t *>(what);
-        to.records.back().assign(bytes, bytes + sizeof(record));
-    }
-}
-
-// fill stores what the script says in the information record, also when the answer is a failure.
-template <typename word, typename info, typename filler>
-void *create(const char *name, const char *kind, const mtsrc_io *io, word *unread, info *record,
-             filler fill) {
-    guard held(w().lock);
-    const auto path = w().by_path.find(io && io->path ? io->path : "");
-    const size_t number = path == w().by_path.end() ? w().current : path->second;
-    const int32_t failure = take(name, 0);
-    object *made = failure ? nullptr : make(kind, number);
-    call &noted = note(name, made, failure);
-    hand(noted, io);
-    hand(noted, unread);
-    hand(noted, record);
-    const script what = w().scripts.empty() ? script() : *w().scripts[number];
-    fill(what, record, name);
-    return made;
-}
-
-template <typename config>
-void *create_decoder(const char *name, const char *kind, const config *record) {
-    guard held(w().lock);
-    const int32_t failure = take(name, 0);
-    object *made = failure ? nullptr : make(kind, w().current);
-    hand(note(name, made, failure), record);
-    return made;
-}
-
-template <typename info, typename filler>
-int32_t stream_info(const char *name, const char *kind, void *handle, info *record, filler fill) {
-    guard held(w().lock);
-    call &noted = note(name, handle, take(name, 0));
-    hand(noted, record);
-    if (object *of = checked(name, handle, kind)) {
-        fill(*of->what, record, name);
-    }
-    return noted.result;
-}
+int32_t init();
+void deinit();
+int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_t *first,
+                   int64_t *second);
+int32_t move(void *handle, int64_t position, int64_t *reached, int32_t flags);
+int32_t decode(void *handle, const wexa_frame *what, wexa_output *output, wexa_status *status);
 
 }  // namespace scripted
 
