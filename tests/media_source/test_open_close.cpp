@@ -21,7 +21,7 @@ TEST_F(OpenClose, CallsRecordsAndOrder) {
         EXPECT_EQ(src->format.bits, 16);
         EXPECT_EQ(src->format.duration, what.duration);
         // Reader: the handle's callbacks, word and information record zeroed.
-        const scripted::call reader = scripted::calls()[row.libraries.size()];
+        const scripted::call reader = scripted::calls_of(row.opens[row.libraries.size()])[0];
         EXPECT_EQ(reader.addresses[0], &src->io);
         EXPECT_EQ(reader.records[1], zeros(reader.records[1].size()));
         EXPECT_EQ(reader.records[2], zeros(reader.records[2].size()));
@@ -34,9 +34,6 @@ TEST_F(OpenClose, CallsRecordsAndOrder) {
         scripted::forget_calls();
         close_source();
         EXPECT_EQ(scripted::call_names(), row.closes);
-        for (const std::string &library : row.libraries) {
-            EXPECT_EQ(scripted::balance(library), 0) << library;
-        }
     });
 }
 

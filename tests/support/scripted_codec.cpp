@@ -17,15 +17,16 @@ struct label {
     uint32_t zero = 0;
 };
 
-void for_each_tag(wexa_tags *tags, void (*act)(void **, int *), int *count) {
+// Where the record's buffers hang.
+std::vector<void **> buffers_of(wexa_tags *tags) {
+    std::vector<void **> places = {&tags->last};
     for (wexa_tag_text &text : tags->text) {
-        act(&text.data, count);
+        places.push_back(&text.data);
     }
     for (wexa_tag_entry &entry : tags->entry) {
-        act(&entry.first, count);
-        act(&entry.second, count);
+        places.insert(places.end(), {&entry.first, &entry.second});
     }
-    act(&tags->last, count);
+    return places;
 }
 
 const frame *find(const wexa_frame *of) {
@@ -46,27 +47,8 @@ int64_t start_of(const script &what, size_t index) {
     return start < 0 ? static_cast<int64_t>(index) : start;
 }
 
-// "xaacfd" of "xaacfd_create".
-std::string kind_of_call() {
-    const std::string &name = w().calls.back().name;
-    return name.substr(0, name.find('_'));
-}
-
 void fault(const std::string &what) {
     w().faults.push_back(w().calls.back().name + ": " + what);
-}
-
-object *checked(void *handle, const std::string &kind) {
-    auto *of = static_cast<object *>(handle);
-    if (!w().alive.count(of)) {
-        fault("no such object");
-        return nullptr;
-    }
-    if (of->kind != kind) {
-        fault("object of kind " + of->kind);
-        return nullptr;
-    }
-    return of;
 }
 
 }  // namespace
@@ -81,8 +63,9 @@ wexa_tags *make_tags(const script &what) {
         return nullptr;
     }
     auto *tags = static_cast<wexa_tags *>(calloc(1, sizeof(wexa_tags)));
-    for_each_tag(
-        tags, [](void **place, int *) { *place = malloc(24); }, nullptr);
+    for (void **place : buffers_of(tags)) {
+        *place = malloc(24);
+    }
     w().tags.push_back(tags);
     return tags;
 }
@@ -106,8 +89,22 @@ int32_t take(int32_t otherwise) {
     return told("result", otherwise);
 }
 
-object *checked(void *handle) {
-    return checked(handle, kind_of_call());
+std::string kind_of_call() {
+    const std::string &name = w().calls.back().name;
+    return name.substr(0, name.find('_'));
+}
+
+object *checked(void *handle, const std::string &kind) {
+    auto *of = static_cast<object *>(handle);
+    if (!w().alive.count(of)) {
+        fault("no such object");
+        return nullptr;
+    }
+    if (of->kind != kind) {
+        fault("object of kind " + of->kind);
+        return nullptr;
+    }
+    return of;
 }
 
 object *make(size_t script_number) {
@@ -151,16 +148,6 @@ void destroy(void *handle) {
     }
     w().alive.erase(of);
     delete of;
-}
-
-int32_t init() {
-    const int32_t result = take(0);
-    w().balance[kind_of_call()] += result == 0;
-    return result;
-}
-
-void deinit() {
-    --w().balance[kind_of_call()];
 }
 
 int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_t *first,
@@ -266,15 +253,7 @@ void reset() {
     for (object *left : w().alive) {
         delete left;
     }
-    w().tags.clear();
-    w().alive.clear();
-    w().scripts = {std::make_shared<const script>()};
-    w().answers.clear();
-    w().calls.clear();
-    w().balance.clear();
-    w().faults.clear();
-    w().flac_flag = true;
-    w().tamper = nullptr;
+    static_cast<contents &>(w()) = contents{};
 }
 
 void tamper(tampering with) {
@@ -290,11 +269,6 @@ void use(const script &what) {
 void answer(const std::string &name, const std::vector<int32_t> &results) {
     const lock held(w().lock);
     w().answers[name].assign(results.begin(), results.end());
-}
-
-std::vector<call> calls() {
-    const lock held(w().lock);
-    return w().calls;
 }
 
 std::vector<call> calls_of(const std::string &name) {
@@ -327,17 +301,13 @@ int live_objects() {
     return static_cast<int>(w().alive.size());
 }
 
-int balance(const std::string &library) {
-    const lock held(w().lock);
-    return w().balance[library];
-}
-
 int tag_buffers_left() {
     const lock held(w().lock);
     int count = 0;
     for (wexa_tags *tags : w().tags) {
-        for_each_tag(
-            tags, [](void **place, int *left) { *left += *place != nullptr; }, &count);
+        for (void **place : buffers_of(tags)) {
+            count += *place != nullptr;
+        }
     }
     return count;
 }
@@ -357,15 +327,13 @@ script song(const std::vector<int16_t> &interleaved, int32_t channels, int32_t s
     script made;
     made.sample_rate = sample_rate;
     made.channels = channels;
-    const size_t total = interleaved.size() / static_cast<size_t>(channels);
-    made.duration = static_cast<int64_t>(total) * 10'000'000 / sample_rate;
-    for (size_t at = 0; at < total; at += static_cast<size_t>(frame_samples)) {
-        const size_t end = std::min(total, at + static_cast<size_t>(frame_samples));
+    const auto total = static_cast<int64_t>(interleaved.size()) / channels;
+    made.duration = total * 10'000'000 / sample_rate;
+    for (int64_t at = 0; at < total; at += frame_samples) {
+        const int64_t end = std::min(total, at + frame_samples);
         frame one;
-        one.pcm.assign(
-            interleaved.begin() + static_cast<std::ptrdiff_t>(at * static_cast<size_t>(channels)),
-            interleaved.begin() + static_cast<std::ptrdiff_t>(end * static_cast<size_t>(channels)));
-        one.start = static_cast<int64_t>(at) * 10'000'000 / sample_rate;
+        one.pcm.assign(interleaved.begin() + at * channels, interleaved.begin() + end * channels);
+        one.start = at * 10'000'000 / sample_rate;
         made.frames.push_back(one);
     }
     return made;

@@ -81,16 +81,14 @@ void use(const script &what);
 // 0), the next again the one after.
 void answer(const std::string &name, const std::vector<int32_t> &results);
 
-std::vector<call> calls();
 std::vector<call> calls_of(const std::string &name);
 std::vector<std::string> call_names();
 void forget_calls();
 
-int live_objects();                       // created, not deleted
-int balance(const std::string &library);  // "xaac": inits that succeeded less deinits
-int tag_buffers_left();                   // pointers not null in the tag records given out
-std::vector<std::string> faults();        // wrong objects, double deletions, short buffers
-bool flac_flag_always_set();              // at each read so far; the reads clear it again
+int live_objects();                 // created, not deleted
+int tag_buffers_left();             // pointers not null in the tag records given out
+std::vector<std::string> faults();  // wrong objects, double deletions, short buffers
+bool flac_flag_always_set();        // at each read so far; the reads clear it again
 
 // A script of PCM cut into frames of frame_samples (per channel), each starting at its time.
 script song(const std::vector<int16_t> &interleaved, int32_t channels, int32_t sample_rate,

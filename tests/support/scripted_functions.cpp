@@ -60,11 +60,10 @@ extern "C" {
 #define SCRIPTED_DECODER(library, decoder, config_record)                            \
     int32_t library##_init(void) {                                                   \
         const auto held = called(__func__);                                          \
-        return scripted::init();                                                     \
+        return scripted::take(0);                                                    \
     }                                                                                \
     void library##_deinit(void) {                                                    \
         const auto held = called(__func__);                                          \
-        scripted::deinit();                                                          \
     }                                                                                \
     void *decoder##_create(const config_record *config, void *) {                    \
         const auto held = called(__func__, config);                                  \

@@ -25,17 +25,20 @@ struct object {
     int streams = 0;
 };
 
-struct world {
-    std::mutex lock = {};
+// What a reset begins anew.
+struct contents {
     std::vector<std::shared_ptr<const script>> scripts = {std::make_shared<const script>()};
     std::map<std::string, std::deque<int32_t>> answers = {};
     std::vector<call> calls = {};
     std::set<object *> alive = {};
-    std::map<std::string, int> balance = {};
     std::vector<wexa_tags *> tags = {};
     std::vector<std::string> faults = {};
     bool flac_flag = true;
     tampering tamper = nullptr;
+};
+
+struct world : contents {
+    std::mutex lock;
 };
 
 world &w();
@@ -69,10 +72,13 @@ number told(const char *value, number truth) {
 // The call's result: the next answer laid down for its function, else the other value.
 int32_t take(int32_t otherwise);
 
-// The object behind the handle when it is alive and the function's own; else null and a fault.
-object *checked(void *handle);
+// "xaacfd" of "xaacfd_create".
+std::string kind_of_call();
 
-// A new object of the function's kind, null when the call's result is a failure.
+// The object behind the handle when it is alive and of that kind; else null and a fault.
+object *checked(void *handle, const std::string &kind = kind_of_call());
+
+// A new object of the call's kind, null when the call's result is a failure.
 object *make(size_t script_number);
 object *make();  // with the latest script
 object *open_stream(void *demux, int32_t index);
@@ -80,8 +86,6 @@ void destroy(void *handle);
 
 wexa_tags *make_tags(const script &what);
 
-int32_t init();
-void deinit();
 int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                    int64_t *second);
 int32_t move(void *handle, int64_t position, int64_t *reached, int32_t flags);

@@ -11,6 +11,8 @@ constexpr double kHitSeconds = 0.25;   // a hit has decayed by then
 constexpr double kNoiseDecay = 0.008;  // seconds, the stick: a short burst over the whole band
 constexpr double kKickDecay = 0.06;    // seconds
 constexpr double kKickHz = 62.0;
+constexpr double kFirstHit = 0.5;   // seconds
+constexpr double kQuietGain = 0.2;  // of everything outside the loud section
 constexpr double kChordBeats = 16.0;
 constexpr double kOtherChannels = 0.8;  // of the first channel's bed
 constexpr double kFloor = 0.0008;       // noise floor of full scale: no digital silence, no ties
@@ -43,9 +45,9 @@ noise seeded(uint32_t seed, uint32_t use) {
 }
 
 double gain_at(const song_spec &plan, double t) {
-    if (t < plan.loud_at || t >= plan.tail_at) return plan.quiet_gain;
+    if (t < plan.loud_at || t >= plan.tail_at) return kQuietGain;
     const double to_go = plan.loud_at > 0.0 ? 1.0 - (t - plan.loud_at) / kSwellSeconds : 0.0;
-    return plan.loud_gain * (1.0 - kSwell * std::fmax(to_go, 0.0));
+    return 1.0 - kSwell * std::fmax(to_go, 0.0);
 }
 
 double bed_gain_at(const song_spec &plan, double t) {
@@ -72,7 +74,7 @@ void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     for (size_t i = 0; i < out.size(); ++i) {
         const double t = static_cast<double>(i) / plan.rate;
         // Chords change on the grid of the hits; one whole cycle ahead keeps the index positive.
-        const double chord = (t - plan.first_hit) / chord_seconds + 4.0;
+        const double chord = (t - kFirstHit) / chord_seconds + 4.0;
         phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / plan.rate;
         const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
                            std::sin(4.0 * phase + offset[1]);
@@ -109,10 +111,9 @@ song make_song(const song_spec &plan) {
     const size_t frames = static_cast<size_t>(std::llround(plan.seconds * plan.rate));
     const size_t channels = static_cast<size_t>(plan.channels);
     for (int k = 0;; ++k) {
-        const double t = plan.first_hit + k * 60.0 / plan.bpm;
+        const double t = kFirstHit + k * 60.0 / plan.bpm;
         if (t >= plan.seconds) break;
-        made.beats.push_back(t);
-        if (t < plan.gap_from || t >= plan.gap_to) made.hits.push_back(t);
+        made.hits.push_back(t);
     }
 
     std::vector<double> drums(frames, 0.0);

@@ -9,30 +9,24 @@
 
 namespace support {
 
-// A quiet opening, a loud section from loud_at on, a quiet tail from tail_at on. Hits fall on every
-// beat of the grid first_hit + k * 60 / bpm; between gap_from and gap_to the grid goes on without
-// audible hits.
+// A quiet opening, a loud section from loud_at on, a quiet tail from tail_at on. Hits fall at half
+// a second and every beat from there on.
 struct song_spec {
     int32_t rate = 44100;  // Hz
     int32_t channels = 2;  // the first is louder; each has a noise floor of its own
     double seconds = 60.0;
     double bpm = 120.0;
-    uint32_t seed = 1;        // varies the hits' strengths (no two alike), the noise and the bed
-    double loud_at = 20.0;    // seconds; 0 or less: loud from the start
-    double tail_at = 50.0;    // seconds; at or past the end: no tail
-    double quiet_gain = 0.2;  // of everything outside the loud section
-    double loud_gain = 1.0;
-    double first_hit = 0.5;               // seconds
-    double gap_from = 0.0, gap_to = 0.0;  // seconds, half open
-    double drum_level = 0.30;             // of full scale, before the gain
-    double bed_level = 0.40;              // of full scale, before the gain; 0 for drums alone
+    uint32_t seed = 1;         // varies the hits' strengths (no two alike), the noise and the bed
+    double loud_at = 20.0;     // seconds; 0 or less: loud from the start
+    double tail_at = 50.0;     // seconds; at or past the end: no tail
+    double drum_level = 0.30;  // of full scale, before the gain
+    double bed_level = 0.40;   // of full scale, before the gain; 0 for drums alone
 };
 
 struct song {
     song_spec plan;
-    std::vector<int16_t> pcm;   // [frames * channels] interleaved
-    std::vector<double> beats;  // seconds, the whole grid
-    std::vector<double> hits;   // seconds, the audible ones
+    std::vector<int16_t> pcm;  // [frames * channels] interleaved
+    std::vector<double> hits;  // seconds
 };
 
 song make_song(const song_spec &plan);
@@ -40,8 +34,8 @@ song make_song(const song_spec &plan);
 // The samples of one channel.
 std::vector<int16_t> channel_of(const song &from, int32_t channel);
 
-enum class wav_coding { pcm8, pcm16, pcm24, pcm32, float32 };
-enum class wav_data_size { honest, zero, all_ones, too_large };  // what the data header claims
+enum class wav_coding { pcm8 = 1, pcm16, pcm24, pcm32, float32 };  // bytes, but the last
+enum class wav_data_size { honest, zero, all_ones, too_large };    // what the data header claims
 
 struct wav_spec {
     int32_t rate = 44100;

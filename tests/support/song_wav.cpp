@@ -21,7 +21,7 @@ void put(bytes &out, uint32_t value, int count) {  // little-endian
 }
 
 void put_tag(bytes &out, const char *tag) {
-    for (int i = 0; i < 4; ++i) out.push_back(static_cast<uint8_t>(tag[i]));
+    out.insert(out.end(), tag, tag + 4);
 }
 
 // A chunk with its padding byte where the length is odd.
@@ -33,41 +33,20 @@ void put_chunk(bytes &out, const char *tag, const bytes &body) {
 }
 
 int bytes_per_sample(wav_coding coding) {
-    switch (coding) {
-        case wav_coding::pcm8:
-            return 1;
-        case wav_coding::pcm16:
-            return 2;
-        case wav_coding::pcm24:
-            return 3;
-        case wav_coding::pcm32:
-        case wav_coding::float32:
-            return 4;
-    }
-    return 2;
+    return coding == wav_coding::float32 ? 4 : static_cast<int>(coding);
 }
 
 void put_sample(bytes &out, int16_t sample, wav_coding coding) {
-    const uint32_t wide = static_cast<uint32_t>(static_cast<int32_t>(sample));
-    switch (coding) {
-        case wav_coding::pcm8:
-            out.push_back(static_cast<uint8_t>((sample >> 8) + 128));
-            break;
-        case wav_coding::pcm16:
-            put(out, wide, 2);
-            break;
-        case wav_coding::pcm24:
-            put(out, wide << 8, 3);
-            break;
-        case wav_coding::pcm32:
-            put(out, wide << 16, 4);
-            break;
-        case wav_coding::float32: {
-            const float value = static_cast<float>(sample) / 32768.0F;
-            uint32_t bits = 0;
-            memcpy(&bits, &value, sizeof(bits));
-            put(out, bits, 4);
-        }
+    const int size = bytes_per_sample(coding);
+    if (coding == wav_coding::pcm8) {
+        out.push_back(static_cast<uint8_t>((sample >> 8) + 128));
+    } else if (coding == wav_coding::float32) {
+        const float value = static_cast<float>(sample) / 32768.0F;
+        uint32_t bits = 0;
+        memcpy(&bits, &value, sizeof(bits));
+        put(out, bits, size);
+    } else {
+        put(out, static_cast<uint32_t>(sample) << (8 * size - 16), size);
     }
 }
 
@@ -93,17 +72,9 @@ bytes format_chunk(const wav_spec &plan) {
 }
 
 uint32_t claimed_size(wav_data_size claim, uint32_t real) {
-    switch (claim) {
-        case wav_data_size::honest:
-            return real;
-        case wav_data_size::zero:
-            return 0;
-        case wav_data_size::all_ones:
-            return 0xFFFFFFFFU;
-        case wav_data_size::too_large:
-            return real + 1'000'000U;
-    }
-    return real;
+    if (claim == wav_data_size::zero) return 0;
+    if (claim == wav_data_size::all_ones) return 0xFFFFFFFFU;
+    return claim == wav_data_size::too_large ? real + 1'000'000U : real;
 }
 
 }  // namespace
