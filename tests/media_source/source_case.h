@@ -23,12 +23,12 @@ struct source_row {
     int32_t frame_bytes;
     int32_t channels;             // of the format; 0: the script's
     std::vector<int32_t> config;  // of the decoder, for 5 channels at 22,050 Hz
-    names libraries;
-    std::string reader;             // what its functions' names begin with
-    std::string decoder;            // likewise; empty: none
-    names opens;                    // calls of an open that succeeds
-    std::vector<int32_t> failures;  // the code when that call fails; 0: its result is not tested
-    names closes;
+    names libraries = {};
+    std::string reader = {};             // what its functions' names begin with
+    std::string decoder = {};            // likewise; empty: none
+    names opens = {};                    // calls of an open that succeeds
+    std::vector<int32_t> failures = {};  // the code when that call fails; 0: its result is unused
+    names closes = {};
 
     std::string read() const { return reader + "_get_frm"; }
     std::string seek() const { return reader + "_seek"; }
@@ -41,26 +41,17 @@ inline byte_run wav_file() {
 }
 
 // A format of frames alone, read and decoded by one library.
-inline source_row elementary_row(const char *name, const byte_run &file, const std::string &library,
-                                 int32_t codec, int32_t frame_bytes, int32_t channels,
-                                 const std::vector<int32_t> &config) {
-    return {name,
-            file,
-            0,
-            codec,
-            frame_bytes,
-            channels,
-            config,
-            {library},
-            library + "fd",
-            library + "d",
-            {library + "_init", library + "fd_create", library + "d_create"},
-            {-255, -7, -255},
-            {library + "fd_delete", library + "d_delete", library + "_deinit"}};
+inline source_row elementary(const std::string &library, source_row row) {
+    row.libraries = {library};
+    row.reader = library + "fd";
+    row.decoder = library + "d";
+    row.opens = {library + "_init", row.reader + "_create", row.decoder + "_create"};
+    row.failures = {-255, -7, -255};
+    row.closes = {row.reader + "_delete", row.decoder + "_delete", library + "_deinit"};
+    return row;
 }
 
-inline source_row mp4_row(const char *name, int32_t tag, const source_row &decoded) {
-    source_row row = decoded;
+inline source_row in_mp4(const char *name, int32_t tag, source_row row) {
     row.name = name;
     row.file = zeros(4) + text("ftyp") + zeros(8);
     row.tag = tag;
@@ -74,45 +65,38 @@ inline source_row mp4_row(const char *name, int32_t tag, const source_row &decod
     return row;
 }
 
+inline std::vector<source_row> make_source_rows() {
+    const source_row aac = elementary(
+        "xaac",
+        {"aac", byte_run{0xFF, 0xF1} + zeros(14), 0, 306, 24576, 2, {1, 2, 2, 0, 3, 22050, 5, 0}});
+    const source_row mpeg =
+        elementary("xmp123", {"mpeg", layer3_pair(), 0, 305, 19200, 0, {1, 0, 2, 0}});
+    const source_row flac =
+        elementary("xflac", {"flac", text("fLaC") + zeros(12), 0, 322, 131070, 2, {1, 2, 2, 0}});
+    source_row ogg = {"ogg", text("OggS") + zeros(12), 0, 323, 16384, 1, {1, 1, 2, 0}};
+    ogg.libraries = {"xvorbis"};
+    ogg.reader = "xoggds";
+    ogg.decoder = "xvorbisd";
+    ogg.opens = {"xvorbis_init",      "xoggd_create",      "xoggds_open",     "xoggds_get_info_aud",
+                 "xoggds_get_format", "xoggds_get_format", "xvorbisd_create", "xvorbisd_decode"};
+    ogg.failures = {-255, -7, -7, -7, -7, -7, -255, -255};
+    ogg.closes = {"xoggds_close", "xoggd_delete", "xvorbisd_delete", "xvorbis_deinit"};
+    source_row wav = {"wav", wav_file(), 0, 2006, 16384, 0, {}};
+    wav.reader = "xwavd";
+    wav.opens = {"xwavd_create"};
+    wav.failures = {-7};
+    wav.closes = {"xwavd_delete"};
+    return {aac,
+            mpeg,
+            flac,
+            in_mp4("mp4 with aac", kWexaTagAac, aac),
+            in_mp4("mp4 with mpeg", kWexaTagMpegLayer3, mpeg),
+            ogg,
+            wav};
+}
+
 inline const std::vector<source_row> &source_rows() {
-    static const source_row aac = elementary_row("aac", byte_run{0xFF, 0xF1} + zeros(14), "xaac",
-                                                 306, 24576, 2, {1, 2, 2, 0, 3, 22050, 5, 0});
-    static const source_row mpeg =
-        elementary_row("mpeg", layer3_pair(), "xmp123", 305, 19200, 0, {1, 0, 2, 0});
-    static const std::vector<source_row> rows = {
-        aac,
-        mpeg,
-        elementary_row("flac", text("fLaC") + zeros(12), "xflac", 322, 131070, 2, {1, 2, 2, 0}),
-        mp4_row("mp4 with aac", kWexaTagAac, aac),
-        mp4_row("mp4 with mpeg", kWexaTagMpegLayer3, mpeg),
-        {"ogg",
-         text("OggS") + zeros(12),
-         0,
-         323,
-         16384,
-         1,
-         {1, 1, 2, 0},
-         {"xvorbis"},
-         "xoggds",
-         "xvorbisd",
-         {"xvorbis_init", "xoggd_create", "xoggds_open", "xoggds_get_info_aud", "xoggds_get_format",
-          "xoggds_get_format", "xvorbisd_create", "xvorbisd_decode"},
-         {-255, -7, -7, -7, -7, -7, -255, -255},
-         {"xoggds_close", "xoggd_delete", "xvorbisd_delete", "xvorbis_deinit"}},
-        {"wav",
-         wav_file(),
-         0,
-         2006,
-         16384,
-         0,
-         {},
-         {},
-         "xwavd",
-         "",
-         {"xwavd_create"},
-         {-7},
-         {"xwavd_delete"}},
-    };
+    static const std::vector<source_row> rows = make_source_rows();
     return rows;
 }
 
