@@ -7,26 +7,21 @@ using Elementary = SourceTest;
 
 constexpr int32_t kNothing = 99;  // in place of a result: a decoding that gives no PCM
 
-// Frames of one stereo group, (first, 0), so that every reduction but MPEG's gives `first`.
-scripted::frame group(int16_t first, int32_t decode = 0) {
+// A frame of one stereo group, with the same in both channels.
+scripted::frame group(int16_t value, int32_t decode = 0) {
     scripted::frame one;
-    one.pcm = {first, 0};
+    one.pcm = {value, value};
     one.decode = decode == kNothing ? 0 : decode;
     one.produced = decode == kNothing ? 0 : 1;
-    one.start = 1000 + first;  // none is the stream's first
+    one.start = 1000 + value;  // none is the stream's first
     return one;
 }
 
-// The bytes of a delivered frame of group(first) for a row: Ogg keeps both samples.
-samples expected_of(const source_row &row, const samples &firsts) {
+// What is delivered of such groups: one sample, but by Ogg both.
+samples expected_of(const source_row &row, const samples &values) {
     samples out;
-    for (const int16_t first : firsts) {
-        if (row.codec == 323) {
-            out.insert(out.end(), {first, 0});
-        } else {
-            const bool mean = std::string(row.name) == "mpeg";
-            out.push_back(static_cast<int16_t>(mean ? first / 2 : first));
-        }
+    for (const int16_t value : values) {
+        out.insert(out.end(), row.codec == 323 ? 2 : 1, value);
     }
     return out;
 }

@@ -11,15 +11,21 @@ TEST_F(OpenClose, CallsRecordsAndOrder) {
         what.tags = true;
         what.sample_rate = 22050;
         what.channels = 5;
+        what.duration = 123'456'789'012;
         ASSERT_EQ(open_row(row, what), 0);
         EXPECT_EQ(scripted::call_names(), row.opens);
         EXPECT_EQ(scripted::tag_buffers_left(), 0);
         EXPECT_EQ(src->codec, row.codec);
         EXPECT_EQ(src->frm_buf_size, row.frame_bytes);
-        EXPECT_EQ(src->format.sample_rate, 22050);
-        EXPECT_EQ(src->format.channels, row.channels ? row.channels : 5);
-        EXPECT_EQ(src->format.bits, 16);
-        EXPECT_EQ(src->format.duration, what.duration);
+        mtsrc_format format;
+        memset(&format, 0xAB, sizeof(format));
+        EXPECT_EQ(mtsrc_getstream_format(src, &format), 0);
+        EXPECT_EQ(format.sample_rate, 22050);
+        EXPECT_EQ(format.channels, row.channels ? row.channels : 5);
+        EXPECT_EQ(format.bits, 16);
+        EXPECT_EQ(format.duration, what.duration);
+        const uint8_t *gap = reinterpret_cast<uint8_t *>(&format) + 12;  // the caller's
+        EXPECT_EQ(byte_run(gap, gap + 4), byte_run(4, 0xAB));
         // Reader: the handle's callbacks, word and information record zeroed.
         const scripted::call reader = scripted::calls_of(row.opens[row.libraries.size()])[0];
         EXPECT_EQ(reader.addresses[0], &src->io);
