@@ -36,10 +36,10 @@ const frame *find(const wexa_frame *of) {
     }
     memcpy(&mark, of->data, sizeof(mark));
     if (memcmp(mark.magic, "SCFR", 4) != 0 || mark.script >= w().scripts.size() ||
-        mark.index >= w().scripts[mark.script]->frames.size()) {
+        mark.index >= w().scripts[mark.script].frames.size()) {
         return nullptr;
     }
-    return &w().scripts[mark.script]->frames[mark.index];
+    return &w().scripts[mark.script].frames[mark.index];
 }
 
 int64_t start_of(const script &what, size_t index) {
@@ -114,7 +114,7 @@ object *make(size_t script_number) {
     auto *made = new object;
     made->kind = kind_of_call();
     made->script_number = script_number;
-    made->what = w().scripts[script_number];
+    made->what = &w().scripts[script_number];
     w().alive.insert(made);
     return made;
 }
@@ -158,7 +158,9 @@ int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_
         return -1;
     }
     if (of->kind == "xflacfd") {
-        w().flac_flag = w().flac_flag && of->state[kFlacReaderFlag] == 1;
+        if (of->state[kFlacReaderFlag] != 1) {
+            fault("the flag is not set");
+        }
         of->state[kFlacReaderFlag] = 0;
     }
     const std::vector<frame> &frames = of->what->frames;
@@ -263,7 +265,7 @@ void tamper(tampering with) {
 
 void use(const script &what) {
     const lock held(w().lock);
-    w().scripts.push_back(std::make_shared<const script>(what));
+    w().scripts.push_back(what);
 }
 
 void answer(const std::string &name, const std::vector<int32_t> &results) {
@@ -315,11 +317,6 @@ int tag_buffers_left() {
 std::vector<std::string> faults() {
     const lock held(w().lock);
     return w().faults;
-}
-
-bool flac_flag_always_set() {
-    const lock held(w().lock);
-    return w().flac_flag;
 }
 
 script song(const std::vector<int16_t> &interleaved, int32_t channels, int32_t sample_rate,

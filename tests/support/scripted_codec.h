@@ -87,8 +87,7 @@ void forget_calls();
 
 int live_objects();                 // created, not deleted
 int tag_buffers_left();             // pointers not null in the tag records given out
-std::vector<std::string> faults();  // wrong objects, double deletions, short buffers
-bool flac_flag_always_set();        // at each read so far; the reads clear it again
+std::vector<std::string> faults();  // wrong objects, double deletions, short buffers, flags unset
 
 // A script of PCM cut into frames of frame_samples (per channel), each starting at its time.
 script song(const std::vector<int16_t> &interleaved, int32_t channels, int32_t sample_rate,

@@ -12,7 +12,7 @@ using scripted::told;
 namespace {
 
 const script &latest() {
-    return *scripted::w().scripts.back();
+    return scripted::w().scripts.back();
 }
 
 template <typename info>

@@ -5,7 +5,6 @@
 
 #include <deque>
 #include <map>
-#include <memory>
 #include <mutex>
 #include <set>
 
@@ -13,12 +12,13 @@
 
 namespace scripted {
 
-// What the handles point to. state comes first: the FLAC source writes into its reader's.
+// What the handles point to. state comes first: the FLAC source writes into its reader's, before
+// every read, a flag that the read clears.
 struct object {
     uint8_t state[4096] = {};
     std::string kind = {};  // what the names of its functions begin with
     size_t script_number = 0;
-    std::shared_ptr<const script> what = {};
+    const script *what = nullptr;
     size_t place = 0;  // next frame
     size_t seeks = 0;  // answers given
     object *parent = nullptr;
@@ -27,13 +27,12 @@ struct object {
 
 // What a reset begins anew.
 struct contents {
-    std::vector<std::shared_ptr<const script>> scripts = {std::make_shared<const script>()};
+    std::deque<script> scripts = {script()};  // in place until the reset
     std::map<std::string, std::deque<int32_t>> answers = {};
     std::vector<call> calls = {};
     std::set<object *> alive = {};
     std::vector<wexa_tags *> tags = {};
     std::vector<std::string> faults = {};
-    bool flac_flag = true;
     tampering tamper = nullptr;
 };
 
