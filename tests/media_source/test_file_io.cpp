@@ -32,12 +32,12 @@ TEST(FileIo, ReadWriteModeCreatesAndReadOnlyModeDoesNot) {
 }
 
 TEST(FileIo, SeekSkipTellAndSize) {
-    memory_file ten(zeros(10), 4);
-    const int64_t four = 4;
+    memory_file ten(zeros(10), 7);
+    const int64_t one = 1;
     const int64_t zero = 0;
     const int64_t before_start = -1;
-    EXPECT_EQ(ten.at(), 4);
-    EXPECT_EQ(mtsrc_file_skip(&ten.file, &four), 0);
+    EXPECT_EQ(ten.at(), 7);
+    EXPECT_EQ(mtsrc_file_skip(&ten.file, &one), 0);
     EXPECT_EQ(mtsrc_file_skip(&ten.file, &zero), -1);
     EXPECT_EQ(mtsrc_file_skip(&ten.file, &before_start), -1);
     EXPECT_EQ(mtsrc_file_seek(&ten.file, &before_start), -1);

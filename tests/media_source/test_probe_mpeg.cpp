@@ -121,6 +121,8 @@ TEST(ProbeMpeg, TagsInsideTheScannedBytes) {
     byte_run tag = put(id3(1000), 20, layer3_pair());
     EXPECT_EQ(probe(tag), 2199);
     EXPECT_EQ(probe(id3(3) + tag + zeros(20)), 2199);  // a tag right behind a tag
+    tag[3] = 4;
+    EXPECT_EQ(probe(tag), 2199);
     tag[3] = 5;
     EXPECT_EQ(probe(tag), 305);
 }
