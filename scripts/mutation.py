@@ -361,14 +361,16 @@ def main():
         if not shutil.which(tool):
             fail(f"{tool} is missing: run scripts/setup.sh")
     files = all_changes(options.seed)
-    known = {change.id for changes, _ in files.values() for change in changes}
-    unknown = (options.only or set()) - known
+    known = {change.id: change for changes, _ in files.values() for change in changes}
+    unknown = (options.only or set()) - known.keys()
     if unknown:
         fail(f"no such changes: {', '.join(sorted(unknown))}")
     counts = shares(files, options.count)
     table = Table(options.results)
     for name in [each for each in table.rows if each not in known]:
         del table.rows[name]  # its line of code is gone
+    for name, row in table.rows.items():
+        row[1] = f"{known[name].file}:{known[name].line}"
     share = {name: (changes, counts[name]) for name, (changes, _) in files.items()}
     waiting = queue.Queue()
     for name in files:
