@@ -12,8 +12,8 @@ namespace codec_test {
 
 namespace {
 
-constexpr int32_t kRequest = 8192;       // bytes, the pipeline's own
-constexpr size_t kSeamSamples = 30'000;  // compared behind each seek
+constexpr int32_t kRequest = 8192;          // bytes, the pipeline's own
+constexpr ptrdiff_t kSeamSamples = 30'000;  // compared behind each seek
 constexpr size_t kSeams = 40;
 
 // Files that the running program saved; removed when it ends.
@@ -47,6 +47,34 @@ std::string save(const std::string &name, const bytes &contents) {
     EXPECT_TRUE(out.good()) << path;
     saved.paths.push_back(path);
     return path;
+}
+
+bytes part(const bytes &file, size_t from, size_t to) {
+    return {file.begin() + static_cast<ptrdiff_t>(from),
+            file.begin() + static_cast<ptrdiff_t>(std::min(to, file.size()))};
+}
+
+bytes joined(const std::vector<bytes> &pieces) {
+    bytes file;
+    for (const bytes &piece : pieces) file.insert(file.end(), piece.begin(), piece.end());
+    return file;
+}
+
+bytes noise(size_t size) {
+    std::mt19937 random(5);
+    bytes out(size);
+    std::generate(out.begin(), out.end(), [&] { return static_cast<uint8_t>(random()); });
+    return out;
+}
+
+std::vector<samples> wav_channels(const std::string &path) {
+    const bytes file = load(path);
+    std::vector<samples> channels(file[22]);
+    for (size_t i = 44; i + 2 <= file.size(); i += 2) {
+        channels[(i - 44) / 2 % channels.size()].push_back(
+            static_cast<int16_t>(file[i] | file[i + 1] << 8));
+    }
+    return channels;
 }
 
 opened::opened(const std::string &path) {
@@ -90,10 +118,32 @@ samples read_all(const std::string &path) {
     return file.source != nullptr ? read(file.source, SIZE_MAX) : samples{};
 }
 
-void expect_same(const samples &got, const samples &wanted, size_t from, size_t to) {
-    ASSERT_GE(got.size(), to);
-    ASSERT_GE(wanted.size(), to);
-    for (size_t i = from; i < to; ++i) ASSERT_EQ(got[i], wanted[i]) << "sample " << i;
+void expect_same(const samples &got, const samples &wanted) {
+    ASSERT_EQ(got.size(), wanted.size());
+    const auto differs = std::mismatch(got.begin(), got.end(), wanted.begin()).first;
+    EXPECT_EQ(differs - got.begin(), static_cast<ptrdiff_t>(got.size())) << "the first to differ";
+}
+
+void expect_changed(const samples &whole, const std::vector<changed_file> &files) {
+    for (const changed_file &each : files) {
+        SCOPED_TRACE(each.name);
+        const std::string path = save("changed", each.contents);
+        const samples got = read_all(path);
+        ASSERT_EQ(got.size(), each.size);
+        const auto at = [](const samples &all, size_t sample) {
+            return all.begin() + static_cast<ptrdiff_t>(sample);
+        };
+        expect_same({got.begin(), at(got, each.same_until)},
+                    {whole.begin(), at(whole, each.same_until)});
+        if (each.same_from != changed_file::kNever) {
+            const size_t behind = whole.size() - each.same_from;
+            expect_same({at(got, got.size() - behind), got.end()},
+                        {at(whole, each.same_from), whole.end()});
+        }
+        expect_same({at(got, each.silent_from), at(got, each.silent_until)},
+                    samples(each.silent_until - each.silent_from));
+        if (each.exact_seams) expect_exact_seams(path);
+    }
 }
 
 void expect_exact_seams(const std::string &path) {
@@ -127,11 +177,9 @@ void expect_exact_seams(const std::string &path) {
         int64_t again = -1;
         ASSERT_EQ(mtsrc_seekstream(file.source, reached, &again), 0);
         ASSERT_EQ(again, reached);
-        const size_t wanted = std::min(static_cast<size_t>(left), kSeamSamples);
-        const samples got = read(file.source, kSeamSamples);
-        ASSERT_EQ(got.size(), wanted);
-        const auto differs = std::mismatch(got.begin(), got.end(), linear.begin() + sample);
-        ASSERT_EQ(differs.first - got.begin(), static_cast<ptrdiff_t>(wanted)) << sample;
+        const auto from = linear.begin() + sample;
+        const samples wanted(from, from + std::min<ptrdiff_t>(left, kSeamSamples));
+        ASSERT_NO_FATAL_FAILURE(expect_same(read(file.source, kSeamSamples), wanted));
         if (position == duration / 4 * 3) {
             EXPECT_LE(2 * left, duration / 4 * 2 * rate / kUnits);
         }

@@ -1,5 +1,5 @@
-// What the codec tests share: encoded files made by tests/support/make_fixtures.sh, media sources
-// read to the end, and the check that a seek lands where it says.
+// What the codec tests share: encoded files made by tests/support/make_fixtures.sh, pieces of
+// files, media sources read to the end, and the checks of what comes out of them.
 #ifndef TAVO_TESTS_PLATFORM_CODEC_TEST_H
 #define TAVO_TESTS_PLATFORM_CODEC_TEST_H
 
@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "media_source/mtsrc.h"
+#include "media_source/wexaaudio.h"
 
 namespace codec_test {
 
@@ -27,6 +28,18 @@ bytes load(const std::string &path);
 
 // Writes contents to a file of the running test's own and returns its path.
 std::string save(const std::string &name, const bytes &contents);
+
+// The bytes of a file in [from, to).
+bytes part(const bytes &file, size_t from, size_t to = SIZE_MAX);
+
+// The pieces, one behind the other.
+bytes joined(const std::vector<bytes> &pieces);
+
+// As many random bytes, always the same ones.
+bytes noise(size_t size);
+
+// The channels of a file of 16-bit samples behind a 44-byte header.
+std::vector<samples> wav_channels(const std::string &path);
 
 // A source and the path that it reads. source is null when it could not be opened; error says why.
 struct opened {
@@ -47,14 +60,30 @@ samples read(mtsrc_ctx *source, size_t limit, bool *end = nullptr);
 // All of a file's samples.
 samples read_all(const std::string &path);
 
-// The same samples in [from, to).
-void expect_same(const samples &got, const samples &wanted, size_t from, size_t to);
+// The same samples; the first that differs is named.
+void expect_same(const samples &got, const samples &wanted);
 
 // The stream's duration is exact: the samples of a linear read. A seek to each of 40 places reports
 // the first sample at or after it, and delivers from there what a linear read delivers there. The
 // last quarter is no longer than a quarter of the duration holds, so that four parts decoded side
 // by side have the whole stream.
 void expect_exact_seams(const std::string &path);
+
+// A file that lost or gained something, and what comes out of it, counted in samples.
+struct changed_file {
+    const char *name;
+    bytes contents;
+    size_t size;                // of all that comes out
+    size_t same_until = 0;      // before it, as from the whole file
+    size_t same_from = kNever;  // from there on, counted in the whole file, as from it
+    size_t silent_from = 0, silent_until = 0;
+    bool exact_seams = true;
+
+    static constexpr size_t kNever = SIZE_MAX;
+};
+
+// Reads each of the files; whole is what comes out of the one that they were made from.
+void expect_changed(const samples &whole, const std::vector<changed_file> &files);
 
 // The same file after some accidents: flipped bits, runs of noise, zeros and ones, pieces removed,
 // repeated and cut off.
@@ -85,6 +114,12 @@ struct direct {
     direct(const direct &) = delete;
     direct &operator=(const direct &) = delete;
 };
+
+using direct_aac = direct<xaac_info, int64_t, xaacfd_create, xaacfd_delete>;
+using direct_flac = direct<xflac_info, int64_t, xflacfd_create, xflacfd_delete>;
+using direct_mp4 = direct<xmp4_info, int32_t, xmp4fd_create, xmp4fd_delete>;
+using direct_mpeg = direct<xmp123_info, int64_t, xmp123fd_create, xmp123fd_delete>;
+using direct_ogg = direct<xogg_info, int64_t, xoggd_create, xoggd_delete>;
 
 }  // namespace codec_test
 
