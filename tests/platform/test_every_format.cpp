@@ -103,6 +103,7 @@ TEST(LossyFiles, HaveTheSongInItsPlace) {
     }
 }
 
+// The sound beside it is, and has its own duration.
 TEST(Video, IsNotOpened) {
     const auto expect = [](const auto &file, int32_t count,
                            void *(*open)(void *, int32_t, void *)) {
@@ -116,6 +117,8 @@ TEST(Video, IsNotOpened) {
     };
     const direct_mp4 mp4(fixture("video.mp4"));
     expect(mp4, mp4.info.track_count, xmp4fds_open);
+    EXPECT_EQ(mp4.info.duration * 44100 / kUnits,
+              static_cast<int64_t>(read_all(fixture("low.aac")).size()));
     const direct_ogg ogg(fixture("video.ogv"));
     expect(ogg, ogg.info.stream_count, xoggds_open);
 }

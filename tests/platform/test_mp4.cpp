@@ -59,12 +59,5 @@ TEST(Mp4, ReadsDamagedAndCutFiles) {
     EXPECT_EQ(opened(save("cut.m4a", no_table)).error, -7);
 }
 
-TEST(Mp4, DurationIsTheTracks) {
-    const direct_mp4 file(fixture("video.mp4"));
-    ASSERT_NE(file.reader, nullptr);
-    EXPECT_EQ(file.info.duration * 44100 / kUnits,
-              static_cast<int64_t>(read_all(fixture("low.aac")).size()));
-}
-
 }  // namespace
 }  // namespace codec_test

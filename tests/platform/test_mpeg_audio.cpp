@@ -96,25 +96,6 @@ TEST(MpegAudio, KeepsTheTimeOfDamagedFrames) {
     expect_same(read(again.source, 100'000), {from, from + 100'000});
 }
 
-TEST(MpegAudio, MarksTheFirstFrameOnly) {
-    const direct_mpeg file(fixture("vbr.mp3"));
-    ASSERT_NE(file.reader, nullptr);
-    bytes buf(19200);
-    for (int round = 0; round < 2; ++round) {
-        for (int i = 0; i < 100; ++i) {
-            int32_t got = 0;
-            int64_t first = -1;
-            int64_t second = -1;
-            ASSERT_EQ(xmp123fd_get_frm(file.reader, buf.data(), 19200, &got, &first, &second), 0);
-            EXPECT_EQ(first == 0, i == 0) << i;
-        }
-        const int64_t start = 0;
-        int64_t reached = -1;
-        ASSERT_EQ(xmp123fd_seek(file.reader, &start, &reached), 0);
-        EXPECT_EQ(reached, 0);
-    }
-}
-
 TEST(MpegAudio, RefusesFreeFormat) {
     bytes free_format = load(fixture("cbr.mp3"));
     for (const size_t i : cbr_frames(free_format)) free_format[i + 2] &= 0x0F;

@@ -111,50 +111,42 @@ TEST(Ogg, ConcealsDamagedPackets) {
     expect_exact_seams(path);
 }
 
-// Only set-up data sets a decoder up, and nothing is decoded before.
-TEST(Ogg, HandsOutWhatTheDecoderNeeds) {
+// Only set-up data sets a decoder up, and nothing is decoded before. The first packet gives no
+// output.
+TEST(Ogg, SetsTheDecoderUpFirst) {
     const direct_ogg file(fixture("song.ogg"));
     ASSERT_NE(file.reader, nullptr);
-    EXPECT_EQ(file.info.duration, 12 * kUnits);
     void *stream = xoggds_open(file.reader, 0, nullptr);
-    xogg_stream info = {};
-    ASSERT_EQ(xoggds_get_info_aud(stream, &info), 0);
-    EXPECT_EQ(info.codec, 323);
-    EXPECT_EQ(info.sample_rate, 44100);
     int32_t length = 0;
     ASSERT_EQ(xoggds_get_format(stream, nullptr, &length), 0);
     ASSERT_GT(length, 0);
     bytes setup(static_cast<size_t>(length));
     ASSERT_EQ(xoggds_get_format(stream, setup.data(), &length), 0);
+    bytes packet(16384);
+    int32_t size = 0;
+    int64_t first = 0;
+    int64_t second = 0;
+    ASSERT_EQ(xoggds_get_frm(stream, packet.data(), 16384, &size, &first, &second), 0);
+    EXPECT_EQ(second, 0);
 
     const wexa_config config = {1, 1, 2, 0};
     void *decoder = xvorbisd_create(&config, nullptr);
     bytes pcm(16384);
     wexa_output output = {};
     wexa_status status = {};
-    const auto decode = [&](bytes &data, int32_t size, void *to) {
+    const auto decode = [&](bytes &data, int32_t bytes, void *to) {
         wexa_frame frame = {};
         frame.data = data.data();
-        frame.bytes = size;
+        frame.bytes = bytes;
         output.data = to;
         return xvorbisd_decode(decoder, &frame, &output, &status);
     };
-    bytes packet(16384);
-    int32_t size = 0;
-    int64_t first = 0;
-    int64_t second = 0;
-    ASSERT_EQ(xoggds_get_frm(stream, packet.data(), 16384, &size, &first, &second), 0);
-    EXPECT_EQ(second, 0);  // the stream's first packet, which gives no output
     EXPECT_NE(decode(packet, size, pcm.data()), 0);
     EXPECT_NE(decode(setup, length / 2, nullptr), 0);
     EXPECT_EQ(decode(setup, length, nullptr), 0);
     EXPECT_EQ(status.produced, 0);
     EXPECT_EQ(decode(packet, size, pcm.data()), 0);
     EXPECT_EQ(status.produced, 0);
-    ASSERT_EQ(xoggds_get_frm(stream, packet.data(), 16384, &size, &first, &second), 0);
-    EXPECT_EQ(decode(packet, size, pcm.data()), 0);
-    EXPECT_EQ(output.bytes / 2, second * 44100 / kUnits);
-    EXPECT_NE(status.produced, 0);
     xvorbisd_delete(decoder);
 }
 

@@ -61,48 +61,45 @@ bytes patched(bytes file, size_t at, uint64_t value, size_t size = 2) {
 }
 
 TEST(WavReader, ReadsEveryShapeOfHeader) {
-    struct shape {
-        const char *name;
-        size_t frames;  // expected
+    const samples pcm = numbers(60000);
+    const auto wav = [&](auto change) {
         support::wav_spec plan;
-    };
-    std::vector<shape> shapes;
-    const auto add = [&](const char *name, size_t frames, auto change) {
-        shapes.push_back({name, frames, {}});
-        change(shapes.back().plan);
+        change(plan);
+        return support::wav_bytes(pcm, plan);
     };
     using support::wav_data_size;
-    add("plain", 30000, [](support::wav_spec &) {});
-    add("mono", 60000, [](support::wav_spec &s) { s.channels = 1; });
-    add("six", 10000, [](support::wav_spec &s) { s.channels = 6; });
-    add("extensible", 30000, [](support::wav_spec &s) { s.extensible = true; });
-    add("odd", 30000, [](support::wav_spec &s) { s.other_chunks = s.junk_first = true; });
-    add("zero", 30000, [](support::wav_spec &s) { s.data_size = wav_data_size::zero; });
-    add("ones", 30000, [](support::wav_spec &s) { s.data_size = wav_data_size::all_ones; });
-    add("large", 30000, [](support::wav_spec &s) { s.data_size = wav_data_size::too_large; });
-    add("cut", 29998, [](support::wav_spec &s) { s.cut_bytes = 5; });
-    const samples pcm = numbers(60000);
-    for (const shape &each : shapes) {
+    using support::wav_spec;
+    const bytes plain = support::wav_bytes(pcm, {});
+    const bytes swapped =
+        joined({part(plain, 0, kFormat), part(plain, kData), part(plain, kFormat, kData)});
+    const struct {
+        const char *name;
+        bytes contents;
+        int32_t channels;
+        ptrdiff_t frames;
+    } shapes[] = {
+        {"plain", plain, 2, 30000},
+        {"data before format", swapped, 2, 30000},
+        {"mono", wav([](wav_spec &s) { s.channels = 1; }), 1, 60000},
+        {"six", wav([](wav_spec &s) { s.channels = 6; }), 6, 10000},
+        {"extensible", wav([](wav_spec &s) { s.extensible = true; }), 2, 30000},
+        {"odd", wav([](wav_spec &s) { s.other_chunks = s.junk_first = true; }), 2, 30000},
+        {"zero", wav([](wav_spec &s) { s.data_size = wav_data_size::zero; }), 2, 30000},
+        {"ones", wav([](wav_spec &s) { s.data_size = wav_data_size::all_ones; }), 2, 30000},
+        {"large", wav([](wav_spec &s) { s.data_size = wav_data_size::too_large; }), 2, 30000},
+        {"cut", wav([](wav_spec &s) { s.cut_bytes = 5; }), 2, 29998},
+    };
+    for (const auto &each : shapes) {
         SCOPED_TRACE(each.name);
-        const reader file(save("shape.wav", support::wav_bytes(pcm, each.plan)));
+        const reader file(save("shape.wav", each.contents));
         ASSERT_NE(file.handle, nullptr);
         EXPECT_EQ(file.info.codec, kWexaPcm);
         EXPECT_EQ(file.info.bits, 16);
         EXPECT_EQ(file.info.sample_rate, 44100);
-        ASSERT_EQ(file.info.channels, each.plan.channels);
-        EXPECT_EQ(file.info.duration * 44100 / kUnits, static_cast<int64_t>(each.frames));
-        const auto count = static_cast<ptrdiff_t>(each.frames) * each.plan.channels;
-        expect_same(rest(file), {pcm.begin(), pcm.begin() + count});
+        ASSERT_EQ(file.info.channels, each.channels);
+        EXPECT_EQ(file.info.duration * 44100 / kUnits, each.frames);
+        expect_same(rest(file), {pcm.begin(), pcm.begin() + each.frames * each.channels});
     }
-}
-
-TEST(WavReader, TakesTheDataBeforeTheFormat) {
-    const samples pcm = numbers(1000);
-    const bytes file = support::wav_bytes(pcm, {});
-    const reader swapped(save("order.wav", joined({part(file, 0, kFormat), part(file, kData),
-                                                   part(file, kFormat, kData)})));
-    ASSERT_NE(swapped.handle, nullptr);
-    expect_same(rest(swapped), pcm);
 }
 
 // A refused file says why where it can; a header too broken to say anything leaves the record
@@ -164,11 +161,11 @@ TEST(WavReader, SeeksToWholeSecondsAndReportsTimes) {
 TEST(WavReader, ReadsBeyondFourGibibytes) {
     const int64_t size = int64_t{5} << 30;
     const bytes plain = patched(support::wav_bytes({}, {}), kData + 4, 0xFFFFFFFF, 4);
-    bytes sizes(36);  // one chunk: name, 28, and the sizes of the file, the data and a table
-    sizes = patched(patched(sizes, 0, 0x34367364, 4), 4, 28, 4);
+    bytes sizes = {'d', 's', '6', '4', 28};
+    sizes.resize(8 + 28);
     sizes = patched(sizes, 16, static_cast<uint64_t>(size), 8);
-    const bytes head = patched(joined({part(plain, 0, kFormat), sizes, part(plain, kFormat)}), 0,
-                               0x34364652, 4);  // RF64
+    const bytes head =
+        joined({{'R', 'F', '6', '4'}, part(plain, 4, kFormat), sizes, part(plain, kFormat)});
     const std::string path = save("large.wav", head);
     const int fd = open(path.c_str(), O_RDWR);
     const auto end = static_cast<int64_t>(head.size()) + size;
