@@ -154,6 +154,10 @@ TEST(WavReader, SeeksToWholeSecondsAndReportsTimes) {
         EXPECT_EQ(reached * 11025 / kUnits, each.sample);
         expect_same(rest(file), {pcm.begin() + 2 * each.sample, pcm.end()});
     }
+    samples one(1);
+    int32_t got = 0;
+    int64_t unused = 0;
+    EXPECT_EQ(xwavd_get_frm(file.handle, one.data(), 2, &got, &unused, &unused), -1);
 }
 
 // The long form of the header states the size in 64 bits. A sparse file, whose last sample frame
