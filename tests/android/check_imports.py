@@ -26,7 +26,7 @@ def imports(library):
 
 def main():
     with open(sys.argv[2], encoding="utf-8") as lines:
-        allowed = {line.split()[0] for line in lines if line.strip() and not line.startswith("#")}
+        allowed = {name for line in lines if not line.startswith("#") for name in line.split()}
     found = imports(sys.argv[1])
     for name in sorted(found - allowed):
         print(f"{name}: not known to exist on Android")
