@@ -52,6 +52,8 @@ TEST(Files, HoldTheSameSamples) {
         SCOPED_TRACE(pair.file);
         expect_same(read_all(fixture(pair.file)), read_all(fixture(pair.like)));
     }
+    // Of a stereo stream the bare source drops the start.
+    EXPECT_EQ(read_all(fixture("stereo3.mp4")).size(), read_all(fixture("cbr.mp3")).size() + 529);
 }
 
 // Mean square of the difference to a channel that comes so many samples late, over a second.
