@@ -8,6 +8,8 @@
 #include <fstream>
 #include <iterator>
 
+#include "tests/support/song.h"
+
 namespace codec_test {
 
 namespace {
@@ -20,9 +22,7 @@ constexpr size_t kSeams = 40;
 struct saved_files {
     std::vector<std::string> paths;
     ~saved_files() {
-        for (const std::string &path : paths) {
-            unlink(path.c_str());
-        }
+        for (const std::string &path : paths) unlink(path.c_str());
     }
 } saved;
 
@@ -41,10 +41,7 @@ bytes load(const std::string &path) {
 
 std::string save(const std::string &name, const bytes &contents) {
     const std::string path = testing::TempDir() + "tavo_" + std::to_string(getpid()) + "_" + name;
-    std::ofstream out(path, std::ios::binary);
-    out.write(reinterpret_cast<const char *>(contents.data()),
-              static_cast<std::streamsize>(contents.size()));
-    EXPECT_TRUE(out.good()) << path;
+    EXPECT_TRUE(support::write_bytes(path, contents)) << path;
     saved.paths.push_back(path);
     return path;
 }
@@ -67,16 +64,6 @@ bytes noise(size_t size) {
     return out;
 }
 
-std::vector<samples> wav_channels(const std::string &path) {
-    const bytes file = load(path);
-    std::vector<samples> channels(file[22]);
-    for (size_t i = 44; i + 2 <= file.size(); i += 2) {
-        channels[(i - 44) / 2 % channels.size()].push_back(
-            static_cast<int16_t>(file[i] | file[i + 1] << 8));
-    }
-    return channels;
-}
-
 opened::opened(const std::string &path) {
     const mtsrc_param param = {path.c_str()};
     source = mtsrc_init(&param, &error);
@@ -91,7 +78,7 @@ opened::~opened() {
     }
 }
 
-samples read(mtsrc_ctx *source, size_t limit, bool *end) {
+samples read(mtsrc_ctx *source, size_t limit) {
     samples all;
     samples piece(kRequest / 2);
     bool ended = false;
@@ -106,9 +93,6 @@ samples read(mtsrc_ctx *source, size_t limit, bool *end) {
         all.insert(all.end(), piece.begin(), piece.begin() + frame.size / 2);
     }
     all.resize(std::min(all.size(), limit));
-    if (end != nullptr) {
-        *end = ended;
-    }
     return all;
 }
 

@@ -38,9 +38,6 @@ bytes joined(const std::vector<bytes> &pieces);
 // As many random bytes, always the same ones.
 bytes noise(size_t size);
 
-// The channels of a file of 16-bit samples behind a 44-byte header.
-std::vector<samples> wav_channels(const std::string &path);
-
 // A source and the path that it reads. source is null when it could not be opened; error says why.
 struct opened {
     mtsrc_ctx *source = nullptr;
@@ -53,9 +50,8 @@ struct opened {
     opened &operator=(const opened &) = delete;
 };
 
-// Reads up to limit samples from where the source stands. *end: the source reported the end of the
-// stream. Any failure code fails the test.
-samples read(mtsrc_ctx *source, size_t limit, bool *end = nullptr);
+// Reads up to limit samples from where the source stands. Any failure code fails the test.
+samples read(mtsrc_ctx *source, size_t limit);
 
 // All of a file's samples.
 samples read_all(const std::string &path);
