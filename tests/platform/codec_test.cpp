@@ -8,8 +8,6 @@
 #include <fstream>
 #include <iterator>
 
-#include "tests/support/song.h"
-
 namespace codec_test {
 
 namespace {
@@ -41,7 +39,10 @@ bytes load(const std::string &path) {
 
 std::string save(const std::string &name, const bytes &contents) {
     const std::string path = testing::TempDir() + "tavo_" + std::to_string(getpid()) + "_" + name;
-    EXPECT_TRUE(support::write_bytes(path, contents)) << path;
+    std::ofstream out(path, std::ios::binary);
+    out.write(reinterpret_cast<const char *>(contents.data()),
+              static_cast<std::streamsize>(contents.size()));
+    EXPECT_TRUE(out.good()) << path;
     saved.paths.push_back(path);
     return path;
 }

@@ -44,12 +44,11 @@ TEST(MpegAudio, KnowsEveryKindOfEncodersTable) {
 TEST(MpegAudio, PassesTagsAndGarbage) {
     const bytes file = load(fixture("cbr.mp3"));
     const samples plain = read_all(fixture("cbr.mp3"));
-    bytes id3v1(128, 0);
-    memcpy(id3v1.data(), "TAG", 3);
-    bytes ape(32 + 64, 0x20);
-    memcpy(ape.data() + 64, "APETAGEX", 8);
-    const uint8_t ape_tail[] = {0xD0, 7, 0, 0, 96, 0, 0, 0, 1, 0, 0, 0, 0, 0, 0, 0};
-    memcpy(ape.data() + 72, ape_tail, sizeof ape_tail);
+    bytes id3v1 = {'T', 'A', 'G'};
+    id3v1.resize(128);
+    bytes ape_end = {'A', 'P', 'E', 'T', 'A', 'G', 'E', 'X', 0xD0, 7, 0, 0, 64 + 32, 0, 0, 0, 1};
+    ape_end.resize(32);
+    const bytes ape = joined({bytes(64, 0x20), ape_end});
     const bytes front = part(file, 0, cbr_frames(file)[100]);
     const bytes back = part(file, front.size());
     const size_t all = plain.size();
