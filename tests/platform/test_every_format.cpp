@@ -199,7 +199,7 @@ TEST(TagRecord, IsFilledFromEveryFormat) {
     static_cast<uint8_t *>(flac.reader)[kFlacReaderFlag] = 1;  // the source's privilege
 }
 
-// An ID3v2 tag with a title and nothing else; the title's frame claims more than it has.
+// An ID3v2 tag with a title and nothing else, whose frame claims so many bytes more than there are.
 bytes title_tag(uint8_t version, uint8_t flags, const bytes &title, uint8_t more = 0) {
     const auto size = static_cast<uint8_t>(title.size());
     bytes frame = {'T', 'I', 'T', '2', 0, 0, 0, static_cast<uint8_t>(size + more), 0, 0};

@@ -11,22 +11,13 @@ constexpr int32_t kChunk = 16384;  // bytes, the source's buffer
 constexpr size_t kFormat = 12;     // offsets in a plain header: of the format
 constexpr size_t kData = 36;       // of the data
 
-struct reader {
-    xwav_info info = {};
-    void *handle = nullptr;
-
-    explicit reader(const std::string &path) {
-        const mtsrc_io io = io_for(path);
-        int32_t word = 0;
-        handle = xwavd_create(&io, &info, &word);
-    }
-    ~reader() { xwavd_delete(handle); }
-    reader(const reader &) = delete;
-    reader &operator=(const reader &) = delete;
-};
+void *create(const mtsrc_io *io, int32_t *word, xwav_info *info, void * /*reserved*/) {
+    return xwavd_create(io, info, word);
+}
+using direct_wav = direct<xwav_info, int32_t, create, xwavd_delete>;
 
 // Everything from where the reader stands; each chunk must hold whole sample frames and fit.
-samples rest(const reader &from) {
+samples rest(const direct_wav &from) {
     samples all;
     samples chunk(kChunk / 2);
     for (;;) {
@@ -34,16 +25,12 @@ samples rest(const reader &from) {
         int64_t first = 0;
         int64_t second = 0;
         const int32_t code =
-            xwavd_get_frm(from.handle, chunk.data(), kChunk, &got, &first, &second);
-        if (code != 0) {
-            EXPECT_EQ(code, 1);
+            xwavd_get_frm(from.reader, chunk.data(), kChunk, &got, &first, &second);
+        if (code != 0 || got <= 0 || got > kChunk) {
+            EXPECT_EQ(code, 1) << got << " bytes";
             return all;
         }
         EXPECT_EQ(got % (2 * from.info.channels), 0);
-        if (got <= 0 || got > kChunk) {
-            ADD_FAILURE() << got << " bytes";
-            return all;
-        }
         all.insert(all.end(), chunk.begin(), chunk.begin() + got / 2);
     }
 }
@@ -91,8 +78,8 @@ TEST(WavReader, ReadsEveryShapeOfHeader) {
     };
     for (const auto &each : shapes) {
         SCOPED_TRACE(each.name);
-        const reader file(save("shape.wav", each.contents));
-        ASSERT_NE(file.handle, nullptr);
+        const direct_wav file(save("shape.wav", each.contents));
+        ASSERT_NE(file.reader, nullptr);
         EXPECT_EQ(file.info.codec, kWexaPcm);
         EXPECT_EQ(file.info.bits, 16);
         EXPECT_EQ(file.info.sample_rate, 44100);
@@ -131,8 +118,8 @@ TEST(WavReader, RefusesWhatTheSourceCannotUse) {
     };
     for (const auto &each : refusals) {
         SCOPED_TRACE(each.name);
-        const reader refused(save("refused.wav", each.contents));
-        EXPECT_EQ(refused.handle, nullptr);
+        const direct_wav refused(save("refused.wav", each.contents));
+        EXPECT_EQ(refused.reader, nullptr);
         EXPECT_EQ(refused.info.codec, each.codec);
         EXPECT_EQ(refused.info.bits, each.bits);
     }
@@ -142,22 +129,22 @@ TEST(WavReader, SeeksToWholeSecondsAndReportsTimes) {
     const samples pcm = numbers(2 * 22051);  // one sample frame beyond 2 s at 11025 Hz
     support::wav_spec plan;
     plan.rate = 11025;
-    const reader file(save("seek.wav", support::wav_bytes(pcm, plan)));
-    ASSERT_NE(file.handle, nullptr);
+    const direct_wav file(save("seek.wav", support::wav_bytes(pcm, plan)));
+    ASSERT_NE(file.reader, nullptr);
     const struct {
         int64_t seconds, sample;
     } landings[] = {{1, 11025}, {0, 0}, {2, 22050}, {3, 22051}, {INT64_MAX, 22051}, {-5, 0}};
     for (const auto &each : landings) {
         SCOPED_TRACE(each.seconds);
         int64_t reached = -1;
-        ASSERT_EQ(xwavd_seek(file.handle, &each.seconds, &reached, 0), 0);
+        ASSERT_EQ(xwavd_seek(file.reader, &each.seconds, &reached, 0), 0);
         EXPECT_EQ(reached * 11025 / kUnits, each.sample);
         expect_same(rest(file), {pcm.begin() + 2 * each.sample, pcm.end()});
     }
     samples one(1);
     int32_t got = 0;
     int64_t unused = 0;
-    EXPECT_EQ(xwavd_get_frm(file.handle, one.data(), 2, &got, &unused, &unused), -1);
+    EXPECT_EQ(xwavd_get_frm(file.reader, one.data(), 2, &got, &unused, &unused), -1);
 }
 
 // The long form of the header states the size in 64 bits. A sparse file, whose last sample frame
@@ -177,12 +164,12 @@ TEST(WavReader, ReadsBeyondFourGibibytes) {
     ASSERT_EQ(pwrite(fd, mark.data(), 4, end - 4), 4);
     ASSERT_EQ(ftruncate(fd, end + 1), 0);
     close(fd);
-    const reader file(path);
-    ASSERT_NE(file.handle, nullptr);
+    const direct_wav file(path);
+    ASSERT_NE(file.reader, nullptr);
     EXPECT_EQ(file.info.duration * 44100 / kUnits, size / 4);
     const int64_t seconds = size / 4 / 44100;
     int64_t reached = 0;
-    ASSERT_EQ(xwavd_seek(file.handle, &seconds, &reached, 0), 0);
+    ASSERT_EQ(xwavd_seek(file.reader, &seconds, &reached, 0), 0);
     EXPECT_EQ(reached, seconds * kUnits);
     samples wanted(static_cast<size_t>(2 * (size / 4 - seconds * 44100)));
     std::copy(mark.begin(), mark.end(), wanted.end() - 2);
