@@ -113,7 +113,7 @@ std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &
 bool write_bytes(const std::string &path, const std::vector<uint8_t> &content) {
     FILE *file = fopen(path.c_str(), "wb");
     if (file == nullptr) return false;
-    const bool whole = fwrite(content.data(), 1, content.size(), file) == content.size();
+    const bool whole = content.empty() || fwrite(content.data(), content.size(), 1, file) == 1;
     return (fclose(file) == 0) && whole;
 }
 
