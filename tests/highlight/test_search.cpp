@@ -144,4 +144,15 @@ TEST(Search, ARequestedLengthMovesTheStart) {
     for (const auto &c : cases) EXPECT_EQ(search(song, 120, c.hl_param), c.ms) << c.hl_param;
 }
 
+// What passes the song's end begins at the first segment or the first valley, whichever is earlier,
+// or at the one there is. The dips to 0.1 are far below the rest.
+TEST(Search, ALengthBeyondTheEndStartsEarly) {
+    const auto valley_first = runs({{20, 0.5f}, {1, 0.1f}, {9, 0.5f}, {20, 1.0f}, {10, 0.5f}});
+    EXPECT_EQ(search(valley_first, 120, 80), 40000u);  // 20 + 40; the segment is at 29
+    const auto segment_first = runs({{10, 0.5f}, {20, 1.0f}, {9, 0.5f}, {1, 0.1f}, {20, 0.5f}});
+    EXPECT_EQ(search(segment_first, 120, 102), 18000u);  // 9 + 51; the valley is at 39
+    const auto valley_only = runs({{20, 0.5f}, {1, 1.0f}, {10, 0.5f}, {1, 0.1f}, {28, 0.5f}});
+    EXPECT_EQ(search(valley_only, 120, 58), 62000u);  // 31 + 29
+}
+
 }  // namespace
