@@ -46,6 +46,23 @@ TEST(Beats, DrumsOfKnownTempo) {
     }
 }
 
+// The last minute decides, and in a song of more than two minutes the second one. Before and behind
+// it are louder drums of another tempo.
+TEST(Beats, OneMinuteDecidesTheTempo) {
+    for (const std::vector<double> &seconds : {std::vector<double>{50, 60, 0}, {60, 60, 70}}) {
+        std::vector<double> song;
+        for (size_t k = 0; k < 3; ++k) {
+            const bool decides = k == 1;
+            for (const double x : drum_song(decides ? 96 : 128, seconds[k])) {
+                song.push_back(decides ? x : 4.0 * x);
+            }
+        }
+        analysis of(song);
+        getBeatPosition(&of.ctx);
+        EXPECT_TRUE(within_a_frame(of.ctx.onset->bpm, 96)) << of.ctx.onset->bpm;
+    }
+}
+
 // The onset at ten seconds is a beat although only one beat is asked for and much sharper onsets
 // follow it.
 TEST(Beats, RiseForcesABeat) {

@@ -27,6 +27,7 @@ TEST(BringMoreBeat, Cases) {
         {"the strongest of nine first", 2, 99, all, 5, {10, 16, 6, 20, 18}},
         {"one that rounding made smaller", 1, 13, all, 5, {4, 6, 8, 10, 12}},
         {"equal heights: the first one twice", 6, 20, {6, 8, 12, 14, 18, 20}, 3, {18, 8, 8}},
+        {"equal heights, room for one", 6, 20, {6, 8, 12, 14, 18, 20}, 2, {18, 8}},
         {"neighbours", 4, 6, all, 5, {}},
         {"no later peak", 16, 99, all, 5, {18, 20}},
         {"no peak from a on", 21, 99, all, 5, {}},
