@@ -21,7 +21,7 @@ void put(bytes &out, uint32_t value, int count) {  // little-endian
 }
 
 void put_tag(bytes &out, const char *tag) {
-    out.insert(out.end(), tag, tag + 4);
+    for (int i = 0; i < 4; ++i) out.push_back(static_cast<uint8_t>(tag[i]));
 }
 
 // A chunk with its padding byte where the length is odd.
