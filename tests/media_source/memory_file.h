@@ -20,7 +20,7 @@ inline byte_run text(const std::string &what) {
 }
 
 inline byte_run operator+(byte_run left, const byte_run &right) {
-    left.insert(left.end(), right.begin(), right.end());
+    for (const uint8_t byte : right) left.push_back(byte);
     return left;
 }
 
