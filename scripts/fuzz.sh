@@ -15,8 +15,8 @@ targets=( # name, aim in executions, share of the time, longest input in bytes; 
   "source_aac 2000000 20 4096" "source_mpeg 2000000 10 4096" "source_flac 2000000 8 4096"
   "source_mp4 2000000 8 4096" "source_ogg 2000000 4 4096" "source_wav 2000000 3 8192"
   "wav_reader 2000000 3 8192" "recognise 20000000 9 1024" "recognise_far 50000 2 1024"
-  "peaks 5000000 3 1024" "sorts 5000000 3 1024" "transforms 2000000 4 1024"
-  "highlight 5000000 5 1024" "converter 500000 5 1024" "beats 250000 6 1024" "job 50000 3 8192"
+  "peaks 5000000 3 1024" "sorts 5000000 3 1024" "transforms 5000000 4 1024"
+  "highlight 5000000 5 1024" "converter 1000000 5 1024" "beats 1000000 6 1024" "job 50000 3 8192"
 )
 usage() { sed -n '2,4s/^# //p' "$0" >&2; exit 2; }
 mode=minutes amount=
