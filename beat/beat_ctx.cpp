@@ -1,7 +1,7 @@
 #include "beat/beat_ctx.h"
 
+#include "common/worker_group.h"
 #include "dsp/mel.h"
-#include "platform/worker_group.h"
 
 pthread_mutex_t *feat_mutex_mt = nullptr;
 pthread_cond_t *feat_cond_mt = nullptr;

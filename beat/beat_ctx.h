@@ -7,7 +7,8 @@
 #include <cstdint>
 #include <cstdlib>
 
-#include "core/tavo_ctx.h"
+#include "common/alloc.h"
+#include "common/tavo_ctx.h"
 #include "dsp/fft.h"
 
 constexpr int32_t kMelBands = 36;
@@ -99,14 +100,5 @@ inline int64_t analysis_length(const TAVO_CTX *ctx) {
 
 // True when __beat_init got all of its memory, the lock and the condition.
 bool beat_ctx_ready(const TAVO_BEAT_CTX *beat);
-
-// Zeroed room for count items, at least one; null when memory runs out or the size has no place in
-// size_t. Released with free.
-template <typename T>
-T *zeroed_items(int64_t count) {
-    const uint64_t items = count > 0 ? static_cast<uint64_t>(count) : 1;
-    if (items > SIZE_MAX / sizeof(T)) return nullptr;
-    return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
-}
 
 #endif

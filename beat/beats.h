@@ -5,7 +5,7 @@
 #ifndef TAVO_BEAT_BEATS_H
 #define TAVO_BEAT_BEATS_H
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 extern "C" {
 

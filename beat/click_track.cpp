@@ -12,7 +12,7 @@ namespace {
 
 constexpr size_t kHeaderBytes = 44;
 constexpr uint32_t kFileRate = 11025;  // Hz, whatever the analysis rate
-constexpr uint32_t kBytesPerSample = 2;
+constexpr uint32_t kFileSampleBytes = 2;
 constexpr double kTwoPi = 6.283185307179586;
 constexpr double kBlipHz = 4000.0;
 constexpr double kBlipScale = 160.0;  // brings the blip's top to about a quarter
@@ -75,13 +75,13 @@ uint32_t mix_sample(double signal, float blip) {
 }
 
 void write_samples(const double *signal, const float *track, int64_t n, FILE *stream) {
-    uint8_t bytes[kChunk * kBytesPerSample];
+    uint8_t bytes[kChunk * kFileSampleBytes];
     for (int64_t done = 0; done < n; done += kChunk) {
         const int64_t count = n - done < kChunk ? n - done : kChunk;
         for (int64_t i = 0; i < count; ++i) {
-            put_u16(bytes + i * kBytesPerSample, mix_sample(signal[done + i], track[done + i]));
+            put_u16(bytes + i * kFileSampleBytes, mix_sample(signal[done + i], track[done + i]));
         }
-        fwrite(bytes, kBytesPerSample, static_cast<size_t>(count), stream);
+        fwrite(bytes, kFileSampleBytes, static_cast<size_t>(count), stream);
     }
 }
 
@@ -90,18 +90,18 @@ void write_samples(const double *signal, const float *track, int64_t n, FILE *st
 int32_t makeWaveHeader(uint32_t n, FILE *stream) {
     uint8_t header[kHeaderBytes];
     put_tag(header, "RIFF");
-    put_u32(header + 4, kBytesPerSample * n + 36);
+    put_u32(header + 4, kFileSampleBytes * n + 36);
     put_tag(header + 8, "WAVE");
     put_tag(header + 12, "fmt ");
     put_u32(header + 16, 16);  // bytes of the format chunk
     put_u16(header + 20, 1);   // integer PCM
     put_u16(header + 22, 1);   // channel
     put_u32(header + 24, kFileRate);
-    put_u32(header + 28, kFileRate * kBytesPerSample);
-    put_u16(header + 32, kBytesPerSample);
-    put_u16(header + 34, 8 * kBytesPerSample);
+    put_u32(header + 28, kFileRate * kFileSampleBytes);
+    put_u16(header + 32, kFileSampleBytes);
+    put_u16(header + 34, 8 * kFileSampleBytes);
     put_tag(header + 36, "data");
-    put_u32(header + 40, kBytesPerSample * n);
+    put_u32(header + 40, kFileSampleBytes * n);
     return static_cast<int32_t>(fwrite(header, kHeaderBytes, 1, stream));
 }
 

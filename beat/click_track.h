@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <cstdio>
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 extern "C" {
 

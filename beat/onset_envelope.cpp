@@ -2,9 +2,9 @@
 
 #include <cmath>
 
+#include "common/worker_group.h"
 #include "dsp/matrix.h"
 #include "dsp/stats.h"
-#include "platform/worker_group.h"
 
 namespace {
 

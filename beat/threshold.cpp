@@ -1,7 +1,7 @@
 #include "beat/threshold.h"
 
+#include "common/worker_group.h"
 #include "dsp/peaks.h"
-#include "platform/worker_group.h"
 
 namespace {
 

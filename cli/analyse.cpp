@@ -9,7 +9,7 @@
 #include "cli/click.h"
 #include "cli/explain.h"
 #include "cli/library_path.h"
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 namespace {
 

@@ -8,7 +8,7 @@
 
 #include "cli/library_path.h"
 #include "cli/plot.h"
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 #include "highlight/power_envelope.h"
 #include "media_source/mtsrc.h"
 

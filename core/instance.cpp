@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "beat/beats.h"
+#include "common/alloc.h"
 #include "core/lifecycle.h"
 #include "highlight/position.h"
 #include "pcm/decode.h"
@@ -19,20 +20,15 @@ bool has_highlight(int32_t mode) {
     return mode == TAVO_MODE_HIGHLIGHT || mode == TAVO_MODE_BOTH;
 }
 
-template <typename Record>
-Record *new_zeroed() {
-    return static_cast<Record *>(calloc(1, sizeof(Record)));
-}
-
 // The instance with its result record and the sub-contexts of its mode, or null.
 TAVO_CTX *new_instance(int32_t mode) {
-    TAVO_CTX *ctx = new_zeroed<TAVO_CTX>();
+    TAVO_CTX *ctx = zeroed_items<TAVO_CTX>(1);
     if (ctx == nullptr) return nullptr;
     ctx->mode = mode;
-    ctx->info = new_zeroed<TAVO_INFO>();
+    ctx->info = zeroed_items<TAVO_INFO>(1);
     bool complete = ctx->info != nullptr;
     if (complete && has_beats(mode)) {
-        ctx->onset = new_zeroed<TAVO_ONSET_CTX>();
+        ctx->onset = zeroed_items<TAVO_ONSET_CTX>(1);
         complete = ctx->onset != nullptr;
         if (complete) {
             ctx->onset->frame_size = kFrameSize;
@@ -41,7 +37,7 @@ TAVO_CTX *new_instance(int32_t mode) {
         }
     }
     if (complete && has_highlight(mode)) {
-        ctx->hl = new_zeroed<TAVO_HL_CTX>();
+        ctx->hl = zeroed_items<TAVO_HL_CTX>(1);
         complete = ctx->hl != nullptr;
     }
     if (complete) return ctx;

@@ -5,7 +5,7 @@
 #ifndef TAVO_CORE_JOBS_H
 #define TAVO_CORE_JOBS_H
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 extern "C" {
 

@@ -2,7 +2,7 @@
 #ifndef TAVO_CORE_LIFECYCLE_H
 #define TAVO_CORE_LIFECYCLE_H
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 extern "C" {
 

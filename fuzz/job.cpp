@@ -9,7 +9,7 @@
 #include <atomic>
 #include <string>
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 #include "fuzz/fuzz.h"
 
 namespace {

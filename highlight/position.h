@@ -5,7 +5,7 @@
 #ifndef TAVO_HIGHLIGHT_POSITION_H
 #define TAVO_HIGHLIGHT_POSITION_H
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 extern "C" {
 

@@ -6,7 +6,7 @@
 #ifndef TAVO_HIGHLIGHT_POWER_ENVELOPE_H
 #define TAVO_HIGHLIGHT_POWER_ENVELOPE_H
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 extern "C" {
 

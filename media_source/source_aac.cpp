@@ -1,6 +1,6 @@
 #include <cstdlib>
 
-#include "media_source/elementary.h"
+#include "media_source/codec_source.h"
 
 namespace {
 
@@ -14,17 +14,17 @@ int32_t seek_to(mtsrc_ctx *src, const int64_t *position, int64_t *reached) {
     return xaacfd_seek(src->demux, position, reached);
 }
 
-constexpr elementary_ops kAac = {
-    nullptr,                // close_stream
-    xaacfd_delete,          // remove_reader
-    xaacd_delete,           // remove_decoder
-    xaacd_reset,            // reset
-    xaacd_decode,           // decode
-    xaac_deinit,            // deinit
-    read_frame,             // read
-    seek_to,                // move
-    elementary_keep_first,  // reduce
-    0,                      // largest
+constexpr codec_source_ops kAac = {
+    nullptr,                  // close_stream
+    xaacfd_delete,            // remove_reader
+    xaacd_delete,             // remove_decoder
+    xaacd_reset,              // reset
+    xaacd_decode,             // decode
+    xaac_deinit,              // deinit
+    read_frame,               // read
+    seek_to,                  // move
+    codec_source_keep_first,  // reduce
+    0,                        // largest
 };
 
 int32_t create(mtsrc_ctx *src, xaac_info *info) {
@@ -33,7 +33,7 @@ int32_t create(mtsrc_ctx *src, xaac_info *info) {
     if (!src->demux) {
         return -7;
     }
-    const xaac_config config = elementary_aac_config(info->sample_rate, info->channels);
+    const xaac_config config = codec_source_aac_config(info->sample_rate, info->channels);
     src->decoder = xaacd_create(&config, nullptr);
     if (!src->decoder) {
         return -255;
@@ -60,25 +60,25 @@ int32_t mtsource_aac_open(mtsrc_ctx *src) {
     src->decoder = nullptr;
     xaac_info info = {};
     const int32_t code = create(src, &info);
-    return elementary_finish_open(kAac, src, info.tags, code);
+    return codec_source_finish_open(kAac, src, info.tags, code);
 }
 
 void mtsource_aac_close(mtsrc_ctx *src) {
     if (src) {
-        elementary_close(kAac, src);
+        codec_source_close(kAac, src);
     }
 }
 
 int32_t mtsource_aac_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
-    return src ? elementary_get_frm(kAac, src, want, frame) : -4;
+    return src ? codec_source_get_frm(kAac, src, want, frame) : -4;
 }
 
 int32_t mtsource_aac_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {
-    return src ? elementary_seek(kAac, src, position, reached) : -4;
+    return src ? codec_source_seek(kAac, src, position, reached) : -4;
 }
 
 int32_t mtsource_aac_reset(mtsrc_ctx *src) {
-    return src ? elementary_reset(kAac, src) : -4;
+    return src ? codec_source_reset(kAac, src) : -4;
 }
 
 int32_t aac_get_hz(void *reader, void *decoder) {

@@ -1,4 +1,4 @@
-#include "media_source/elementary.h"
+#include "media_source/codec_source.h"
 
 namespace {
 
@@ -19,17 +19,17 @@ int32_t seek_to(mtsrc_ctx *src, const int64_t *position, int64_t *reached) {
     return xflacfd_seek(src->demux, position, reached);
 }
 
-constexpr elementary_ops kFlac = {
-    nullptr,                // close_stream
-    xflacfd_delete,         // remove_reader
-    xflacd_delete,          // remove_decoder
-    xflacd_reset,           // reset
-    xflacd_decode,          // decode
-    xflac_deinit,           // deinit
-    read_frame,             // read
-    seek_to,                // move
-    elementary_keep_first,  // reduce
-    kLargestFrame,          // largest
+constexpr codec_source_ops kFlac = {
+    nullptr,                  // close_stream
+    xflacfd_delete,           // remove_reader
+    xflacd_delete,            // remove_decoder
+    xflacd_reset,             // reset
+    xflacd_decode,            // decode
+    xflac_deinit,             // deinit
+    read_frame,               // read
+    seek_to,                  // move
+    codec_source_keep_first,  // reduce
+    kLargestFrame,            // largest
 };
 
 int32_t create(mtsrc_ctx *src, xflac_info *info) {
@@ -65,23 +65,23 @@ int32_t mtsource_flac_open(mtsrc_ctx *src) {
     src->decoder = nullptr;
     xflac_info info = {};
     const int32_t code = create(src, &info);
-    return elementary_finish_open(kFlac, src, info.tags, code);
+    return codec_source_finish_open(kFlac, src, info.tags, code);
 }
 
 void mtsource_flac_close(mtsrc_ctx *src) {
     if (src) {
-        elementary_close(kFlac, src);
+        codec_source_close(kFlac, src);
     }
 }
 
 int32_t mtsource_flac_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
-    return src ? elementary_get_frm(kFlac, src, want, frame) : -4;
+    return src ? codec_source_get_frm(kFlac, src, want, frame) : -4;
 }
 
 int32_t mtsource_flac_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {
-    return src ? elementary_seek(kFlac, src, position, reached) : -4;
+    return src ? codec_source_seek(kFlac, src, position, reached) : -4;
 }
 
 int32_t mtsource_flac_reset(mtsrc_ctx *src) {
-    return src ? elementary_reset(kFlac, src) : -4;
+    return src ? codec_source_reset(kFlac, src) : -4;
 }

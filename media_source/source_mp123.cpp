@@ -1,6 +1,6 @@
 #include <cstring>
 
-#include "media_source/elementary.h"
+#include "media_source/codec_source.h"
 #include "media_source/pcm_queue.h"
 
 namespace {
@@ -32,7 +32,7 @@ int32_t reduce(const mtsrc_ctx *src, int32_t bytes, int64_t first) {
     return pcm_mean_of_two(src->q_wr, src->q_wr, bytes, src->format.channels);
 }
 
-constexpr elementary_ops kMp123 = {
+constexpr codec_source_ops kMp123 = {
     nullptr,          // close_stream
     xmp123fd_delete,  // remove_reader
     xmp123d_delete,   // remove_decoder
@@ -78,23 +78,23 @@ int32_t mtsource_mp123_open(mtsrc_ctx *src) {
     src->decoder = nullptr;
     xmp123_info info = {};
     const int32_t code = create(src, &info);
-    return elementary_finish_open(kMp123, src, info.tags, code);
+    return codec_source_finish_open(kMp123, src, info.tags, code);
 }
 
 void mtsource_mp123_close(mtsrc_ctx *src) {
     if (src) {
-        elementary_close(kMp123, src);
+        codec_source_close(kMp123, src);
     }
 }
 
 int32_t mtsource_mp123_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
-    return src ? elementary_get_frm(kMp123, src, want, frame) : -4;
+    return src ? codec_source_get_frm(kMp123, src, want, frame) : -4;
 }
 
 int32_t mtsource_mp123_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {
-    return src ? elementary_seek(kMp123, src, position, reached) : -4;
+    return src ? codec_source_seek(kMp123, src, position, reached) : -4;
 }
 
 int32_t mtsource_mp123_reset(mtsrc_ctx *src) {
-    return src ? elementary_reset(kMp123, src) : -4;
+    return src ? codec_source_reset(kMp123, src) : -4;
 }

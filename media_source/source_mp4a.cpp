@@ -1,4 +1,4 @@
-#include "media_source/elementary.h"
+#include "media_source/codec_source.h"
 
 namespace {
 
@@ -18,44 +18,44 @@ void deinit() {
 }
 
 // The decoder follows the handle's codec; without one only what is queued can be delivered.
-constexpr elementary_ops kMp4Aac = {
-    xmp4fds_close,          // close_stream
-    xmp4fd_delete,          // remove_reader
-    xaacd_delete,           // remove_decoder
-    xaacd_reset,            // reset
-    xaacd_decode,           // decode
-    deinit,                 // deinit
-    read_frame,             // read
-    seek_to,                // move
-    elementary_keep_first,  // reduce
-    0,                      // largest
+constexpr codec_source_ops kMp4Aac = {
+    xmp4fds_close,            // close_stream
+    xmp4fd_delete,            // remove_reader
+    xaacd_delete,             // remove_decoder
+    xaacd_reset,              // reset
+    xaacd_decode,             // decode
+    deinit,                   // deinit
+    read_frame,               // read
+    seek_to,                  // move
+    codec_source_keep_first,  // reduce
+    0,                        // largest
 };
-constexpr elementary_ops kMp4Mpeg = {
-    xmp4fds_close,          // close_stream
-    xmp4fd_delete,          // remove_reader
-    xmp123d_delete,         // remove_decoder
-    xmp123d_reset,          // reset
-    xmp123d_decode,         // decode
-    deinit,                 // deinit
-    read_frame,             // read
-    seek_to,                // move
-    elementary_keep_first,  // reduce
-    0,                      // largest
+constexpr codec_source_ops kMp4Mpeg = {
+    xmp4fds_close,            // close_stream
+    xmp4fd_delete,            // remove_reader
+    xmp123d_delete,           // remove_decoder
+    xmp123d_reset,            // reset
+    xmp123d_decode,           // decode
+    deinit,                   // deinit
+    read_frame,               // read
+    seek_to,                  // move
+    codec_source_keep_first,  // reduce
+    0,                        // largest
 };
-constexpr elementary_ops kMp4None = {
-    xmp4fds_close,          // close_stream
-    xmp4fd_delete,          // remove_reader
-    nullptr,                // remove_decoder
-    nullptr,                // reset
-    nullptr,                // decode
-    deinit,                 // deinit
-    read_frame,             // read
-    seek_to,                // move
-    elementary_keep_first,  // reduce
-    0,                      // largest
+constexpr codec_source_ops kMp4None = {
+    xmp4fds_close,            // close_stream
+    xmp4fd_delete,            // remove_reader
+    nullptr,                  // remove_decoder
+    nullptr,                  // reset
+    nullptr,                  // decode
+    deinit,                   // deinit
+    read_frame,               // read
+    seek_to,                  // move
+    codec_source_keep_first,  // reduce
+    0,                        // largest
 };
 
-const elementary_ops &ops_of(const mtsrc_ctx *src) {
+const codec_source_ops &ops_of(const mtsrc_ctx *src) {
     switch (src->codec) {
         case kCodecAac:
             return kMp4Aac;
@@ -67,7 +67,7 @@ const elementary_ops &ops_of(const mtsrc_ctx *src) {
 }
 
 int32_t open_aac(mtsrc_ctx *src, const xmp4_track &track, int64_t duration) {
-    const xaac_config config = elementary_aac_config(track.sample_rate, track.channels);
+    const xaac_config config = codec_source_aac_config(track.sample_rate, track.channels);
     src->decoder = xaacd_create(&config, nullptr);
     if (!src->decoder) {
         return -255;
@@ -146,23 +146,23 @@ int32_t mtsource_mp4a_open(mtsrc_ctx *src) {
     src->decoder = nullptr;
     xmp4_info info = {};
     const int32_t code = create(src, &info);
-    return elementary_finish_open(ops_of(src), src, info.tags, code);
+    return codec_source_finish_open(ops_of(src), src, info.tags, code);
 }
 
 void mtsource_mp4a_close(mtsrc_ctx *src) {
     if (src) {
-        elementary_close(ops_of(src), src);
+        codec_source_close(ops_of(src), src);
     }
 }
 
 int32_t mtsource_mp4a_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
-    return src ? elementary_get_frm(ops_of(src), src, want, frame) : -4;
+    return src ? codec_source_get_frm(ops_of(src), src, want, frame) : -4;
 }
 
 int32_t mtsource_mp4a_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {
-    return src && src->dstream ? elementary_seek(ops_of(src), src, position, reached) : -4;
+    return src && src->dstream ? codec_source_seek(ops_of(src), src, position, reached) : -4;
 }
 
 int32_t mtsource_mp4a_reset(mtsrc_ctx *src) {
-    return src ? elementary_reset(ops_of(src), src) : -4;
+    return src ? codec_source_reset(ops_of(src), src) : -4;
 }

@@ -1,6 +1,6 @@
 #include <cstdlib>
 
-#include "media_source/elementary.h"
+#include "media_source/codec_source.h"
 
 namespace {
 
@@ -18,17 +18,17 @@ int32_t seek_to(mtsrc_ctx *src, const int64_t *position, int64_t *reached) {
     return xoggds_seek(src->dstream, position, reached, 0);
 }
 
-constexpr elementary_ops kOgg = {
-    xoggds_close,         // close_stream
-    xoggd_delete,         // remove_reader
-    xvorbisd_delete,      // remove_decoder
-    xvorbisd_reset,       // reset
-    xvorbisd_decode,      // decode
-    xvorbis_deinit,       // deinit
-    read_frame,           // read
-    seek_to,              // move
-    elementary_keep_all,  // reduce
-    0,                    // largest
+constexpr codec_source_ops kOgg = {
+    xoggds_close,           // close_stream
+    xoggd_delete,           // remove_reader
+    xvorbisd_delete,        // remove_decoder
+    xvorbisd_reset,         // reset
+    xvorbisd_decode,        // decode
+    xvorbis_deinit,         // deinit
+    read_frame,             // read
+    seek_to,                // move
+    codec_source_keep_all,  // reduce
+    0,                      // largest
 };
 
 // On success the caller frees setup->data.
@@ -127,23 +127,23 @@ int32_t mtsource_ogg_open(mtsrc_ctx *src) {
     wexa_frame setup = {};
     const int32_t code = create(src, &info, &setup);
     free(setup.data);
-    return elementary_finish_open(kOgg, src, info.tags, code);
+    return codec_source_finish_open(kOgg, src, info.tags, code);
 }
 
 void mtsource_ogg_close(mtsrc_ctx *src) {
     if (src) {
-        elementary_close(kOgg, src);
+        codec_source_close(kOgg, src);
     }
 }
 
 int32_t mtsource_ogg_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
-    return src ? elementary_get_frm(kOgg, src, want, frame) : -4;
+    return src ? codec_source_get_frm(kOgg, src, want, frame) : -4;
 }
 
 int32_t mtsource_ogg_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {
-    return src ? elementary_seek(kOgg, src, position, reached) : -4;
+    return src ? codec_source_seek(kOgg, src, position, reached) : -4;
 }
 
 int32_t mtsource_ogg_reset(mtsrc_ctx *src) {
-    return src ? elementary_reset(kOgg, src) : -4;
+    return src ? codec_source_reset(kOgg, src) : -4;
 }

@@ -1,5 +1,5 @@
-#include "core/tavo_ctx.h"
-#include "media_source/elementary.h"
+#include "common/tavo_ctx.h"
+#include "media_source/codec_source.h"
 #include "media_source/pcm_queue.h"
 
 namespace {

@@ -7,7 +7,7 @@
 #ifndef TAVO_PCM_DECODE_H
 #define TAVO_PCM_DECODE_H
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 #include "media_source/mtsrc.h"
 
 // One decoding segment. A thread touches only its own record, buffer and source; done is shared and

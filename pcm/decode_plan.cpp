@@ -1,9 +1,9 @@
 #include <algorithm>
 #include <cstdlib>
 
-#include "pcm/byte_size.h"
+#include "common/alloc.h"
+#include "common/worker_group.h"
 #include "pcm/decode.h"
-#include "platform/worker_group.h"
 
 pthread_mutex_t *ext_mutex_mt = nullptr;
 pthread_cond_t *ext_cond_mt = nullptr;

@@ -1,7 +1,7 @@
+#include "common/worker_group.h"
 #include "pcm/decode.h"
 #include "pcm/read_pcm.h"
 #include "pcm/stitch.h"
-#include "platform/worker_group.h"
 
 namespace {
 

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cstdlib>
 
-#include "pcm/byte_size.h"
+#include "common/alloc.h"
 #include "pcm/read_pcm.h"
 #include "pcm/resample.h"
 #include "pcm/stitch.h"

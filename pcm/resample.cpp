@@ -3,10 +3,10 @@
 #include <algorithm>
 #include <cstdlib>
 
+#include "common/alloc.h"
+#include "common/worker_group.h"
 #include "core/tavo.h"
-#include "pcm/byte_size.h"
 #include "pcm/resample_sinc.h"
-#include "platform/worker_group.h"
 
 pthread_mutex_t *ext_mutex_resample = nullptr;
 pthread_cond_t *ext_cond_resample = nullptr;

@@ -1,7 +1,7 @@
 #include <cstdlib>
 
+#include "common/worker_group.h"
 #include "pcm/resample.h"
-#include "platform/worker_group.h"
 
 namespace {
 

@@ -20,6 +20,6 @@ find "$build" -name '*.gcda' -delete
 ctest --test-dir "$build" --parallel "$(nproc)" --output-on-failure --no-tests=error \
   -E '^(repo|packaging|android)[._]'
 gcovr --root . --object-directory "$build" --exclude-throw-branches --exclude-unreachable-branches \
-  --filter '(core|media_source|pcm|highlight|beat|dsp|jni|platform/wexaaudio)/' \
-  --filter 'platform/worker_group' --json "$build/coverage.json" "$build"
+  --filter '(core|media_source|pcm|highlight|beat|dsp|jni|desktop/wexaaudio)/' \
+  --filter 'common/worker_group' --json "$build/coverage.json" "$build"
 python3 scripts/uncovered.py "$build/coverage.json"

@@ -18,7 +18,7 @@ ALL = "library_and_stand_in"
 
 
 def folder_of(file):
-    return "stand_in" if file.startswith("platform/wexaaudio/") else file.split("/")[0]
+    return "stand_in" if file.startswith("desktop/wexaaudio/") else file.split("/")[0]
 
 
 def function_at(functions, line):

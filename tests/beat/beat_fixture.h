@@ -10,7 +10,7 @@
 
 #include "beat/beat_ctx.h"
 #include "beat/beats.h"
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 constexpr double kHop = 256.0 / 11025.0;  // seconds
 

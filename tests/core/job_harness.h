@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 
 namespace job {
 

@@ -2,7 +2,7 @@
 #include <filesystem>
 
 #include "pcm/decode.h"
-#include "tests/platform/codec_test.h"
+#include "tests/desktop/codec_test.h"
 
 namespace {
 

@@ -5,7 +5,7 @@
 
 #include <algorithm>
 
-#include "core/tavo_ctx.h"
+#include "common/tavo_ctx.h"
 #include "media_source/mtsrc_ctx.h"
 #include "tests/pcm/signals.h"
 

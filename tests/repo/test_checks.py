@@ -34,11 +34,11 @@ class Includes(unittest.TestCase):
     def test_directions(self):
         cases = [
             ("dsp/a.cpp", "dsp/b.h", 0),
-            ("dsp/a.cpp", "core/tavo_ctx.h", 0),
+            ("dsp/a.cpp", "common/tavo_ctx.h", 0),
             ("dsp/a.cpp", "beat/b.h", 1),
             ("highlight/a.h", "dsp/b.h", 0),
             ("highlight/a.h", "pcm/b.h", 1),
-            ("media_source/a.cpp", "platform/b.h", 1),
+            ("media_source/a.cpp", "desktop/b.h", 1),
             ("beat/a.cpp", "highlight/b.h", 1),
             ("core/a.cpp", "beat/b.h", 0),
             ("core/a.cpp", "jni/b.h", 1),
@@ -46,7 +46,7 @@ class Includes(unittest.TestCase):
             ("cli/a.cpp", "media_source/mtsrc_ctx.h", 1),
             ("cli/a.cpp", "highlight/power_envelope.h", 0),
             ("cli/a.cpp", "highlight/search.h", 1),
-            ("platform/wexaaudio/a.cpp", "media_source/mtsrc_ctx.h", 1),
+            ("desktop/wexaaudio/a.cpp", "media_source/mtsrc_ctx.h", 1),
         ]
         for source, target, expected in cases:
             with self.subTest(source=source, target=target):

@@ -12,7 +12,7 @@
 #include <thread>
 
 #include "tests/core/job_harness.h"
-#include "tests/platform/codec_test.h"
+#include "tests/desktop/codec_test.h"
 #include "tests/trials/encode.h"
 #include "tests/trials/measure.h"
 #include "tests/trials/trial.h"

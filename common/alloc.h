@@ -1,0 +1,42 @@
+// Checked sizes and zeroed memory. Sizes are 64-bit: the durations and rates that they are made of
+// come from files.
+#ifndef TAVO_COMMON_ALLOC_H
+#define TAVO_COMMON_ALLOC_H
+
+#include <cstdlib>
+
+#include "common/tavo_ctx.h"
+
+constexpr int64_t kBytesPerSample = 2;  // 16-bit mono
+
+// *result = value * factor / divisor, all of them 0 or more, divisor at least 1. False when one is
+// not, or when the product overflows.
+inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *result) {
+    int64_t product = 0;
+    if (value < 0 || factor < 0 || divisor < 1) return false;
+    if (__builtin_mul_overflow(value, factor, &product)) return false;
+    *result = product / divisor;
+    return true;
+}
+
+// Bytes of a span of PCM: units (100 ns) * rate (Hz) * 2 / 10,000,000, the division last. May be
+// odd.
+inline bool span_bytes(int64_t units, int32_t rate, int64_t *bytes) {
+    return scale_size(units, rate * kBytesPerSample, kUnitsPerSecond, bytes);
+}
+
+// Bytes of count elements of size bytes each, and extra bytes behind them.
+inline bool array_bytes(int64_t count, int64_t size, int64_t extra, int64_t *bytes) {
+    return scale_size(count, size, 1, bytes) && !__builtin_add_overflow(*bytes, extra, bytes);
+}
+
+// Zeroed room for count items, at least one. Null when memory runs out or the size exceeds size_t.
+// Released with free.
+template <typename T>
+T *zeroed_items(int64_t count) {
+    const uint64_t items = count > 0 ? static_cast<uint64_t>(count) : 1;
+    if (items > SIZE_MAX / sizeof(T)) return nullptr;
+    return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
+}
+
+#endif

@@ -1,0 +1,72 @@
+#include "common/worker_group.h"
+
+#include <cstdlib>
+
+namespace {
+
+constexpr int32_t kMaxWorkers = 4;
+
+bool all_done(const int32_t *done, int32_t count) {
+    for (int32_t i = 0; i < count; ++i) {
+        if (done[i] != 1) return false;
+    }
+    return true;
+}
+
+}  // namespace
+
+void worker_group_done(pthread_mutex_t *mutex, pthread_cond_t *cond, int32_t *done, int32_t count,
+                       int32_t index) {
+    pthread_mutex_lock(mutex);
+    done[index] = 1;
+    if (all_done(done, count)) pthread_cond_signal(cond);
+    pthread_mutex_unlock(mutex);
+}
+
+void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *mutex,
+                      pthread_cond_t *cond, int32_t *done) {
+    bool started[kMaxWorkers] = {};
+    if (count > kMaxWorkers) count = kMaxWorkers;
+
+    // All flags before the first thread: a quick worker must not see a neighbour's stale flag.
+    for (int32_t i = 0; i < count; ++i) done[i] = 0;
+    for (int32_t i = 0; i < count; ++i) {
+        const worker_slot &slot = slots[i];
+        started[i] = pthread_create(slot.thread, nullptr, slot.entry, slot.record) == 0;
+        if (!started[i]) {
+            slot.body(slot.record);
+            worker_group_done(mutex, cond, done, count, i);
+        }
+    }
+
+    pthread_mutex_lock(mutex);
+    while (!all_done(done, count)) pthread_cond_wait(cond, mutex);
+    pthread_mutex_unlock(mutex);
+
+    for (int32_t i = 0; i < count; ++i) {
+        if (started[i]) pthread_join(*slots[i].thread, nullptr);
+    }
+}
+
+int32_t worker_lock_create(pthread_mutex_t **mutex, pthread_cond_t **cond) {
+    *mutex = static_cast<pthread_mutex_t *>(calloc(1, sizeof(pthread_mutex_t)));
+    *cond = static_cast<pthread_cond_t *>(calloc(1, sizeof(pthread_cond_t)));
+    if (*mutex != nullptr && *cond != nullptr && pthread_mutex_init(*mutex, nullptr) == 0) {
+        if (pthread_cond_init(*cond, nullptr) == 0) return 0;
+        pthread_mutex_destroy(*mutex);
+    }
+    free(*mutex);
+    free(*cond);
+    *mutex = nullptr;
+    *cond = nullptr;
+    return -2;
+}
+
+void worker_lock_release(pthread_mutex_t **mutex, pthread_cond_t **cond) {
+    if (*cond != nullptr) pthread_cond_destroy(*cond);
+    if (*mutex != nullptr) pthread_mutex_destroy(*mutex);
+    free(*cond);
+    free(*mutex);
+    *cond = nullptr;
+    *mutex = nullptr;
+}

@@ -1,4 +1,0 @@
-set(core_sources
-  instance.cpp
-  lifecycle.cpp
-  jobs.cpp)

@@ -1,0 +1,156 @@
+#include "desktop/wexaaudio/aac/aac_config.h"
+
+#include <cstring>
+
+namespace {
+
+constexpr int32_t kRates[] = {96000, 88200, 64000, 48000, 44100, 32000, 24000,
+                              22050, 16000, 12000, 11025, 8000,  7350};
+constexpr int32_t kRateCount = sizeof kRates / sizeof kRates[0];
+constexpr int32_t kMixdownBits[] = {4, 4, 3};  // mono, stereo, matrix
+constexpr int32_t kRateEscape = 15;            // 24 bits of Hz follow
+constexpr int32_t kObjectEscape = 31;          // 6 more bits follow
+
+struct bit_reader {
+    const uint8_t *data;
+    int64_t bits;  // in all
+    int64_t at;
+    bool failed;  // read past the end
+};
+
+uint32_t get(bit_reader *r, int32_t count) {
+    uint32_t value = 0;
+    for (int32_t i = 0; i < count; ++i) {
+        if (r->at >= r->bits) {
+            r->failed = true;
+            return 0;
+        }
+        value = value << 1 | (static_cast<uint32_t>(r->data[r->at / 8]) >> (7 - r->at % 8) & 1U);
+        ++r->at;
+    }
+    return value;
+}
+
+struct bit_writer {
+    uint8_t *data;  // zeroed
+    int64_t at;     // never past kAacMaxConfig * 8: the longest element written has 400 bits
+};
+
+uint32_t put(bit_writer *w, uint32_t value, int32_t count) {
+    for (int32_t i = count - 1; i >= 0; --i) {
+        const uint32_t bit = value >> i & 1U;
+        w->data[w->at / 8] = static_cast<uint8_t>(w->data[w->at / 8] | bit << (7 - w->at % 8));
+        ++w->at;
+    }
+    return value;
+}
+
+// Copies count bits and returns them.
+uint32_t copy(bit_reader *r, bit_writer *w, int32_t count) {
+    return put(w, get(r, count), count);
+}
+
+void put_core(bit_writer *w, const aac_config &config) {
+    put(w, static_cast<uint32_t>(config.object_type), 5);
+    put(w, static_cast<uint32_t>(config.rate_index), 4);
+    put(w, static_cast<uint32_t>(config.channels), 4);
+}
+
+void put_general(bit_writer *w, const aac_config &config) {
+    put(w, config.short_frames ? 1 : 0, 1);
+    put(w, 0, 2);  // no core coder, no extension
+}
+
+}  // namespace
+
+int32_t aac_rate_of_index(int32_t index) {
+    return index >= 0 && index < kRateCount ? kRates[index] : 0;
+}
+
+void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index,
+                     int32_t channels) {
+    *config = {};
+    config->object_type = object_type;
+    config->rate_index = rate_index;
+    config->channels = channels;
+    bit_writer w = {config->bytes, 0};
+    put_core(&w, *config);
+    put_general(&w, *config);
+    config->size = static_cast<int32_t>((w.at + 7) / 8);
+}
+
+int64_t aac_config_from_program(aac_config *config, const uint8_t *data, int32_t bytes,
+                                int64_t start, int32_t object_type, int32_t rate_index) {
+    *config = {};
+    config->object_type = object_type;
+    config->rate_index = rate_index;
+    bit_reader r = {data, static_cast<int64_t>(bytes) * 8, start, false};
+    bit_writer w = {config->bytes, 0};
+    put_core(&w, *config);
+    put_general(&w, *config);
+    copy(&r, &w, 10);  // instance tag, object type, rate index
+    const uint32_t front = copy(&r, &w, 4);
+    const uint32_t side = copy(&r, &w, 4);
+    const uint32_t back = copy(&r, &w, 4);
+    const uint32_t low = copy(&r, &w, 2);
+    const uint32_t data_elements = copy(&r, &w, 3);
+    const uint32_t coupling = copy(&r, &w, 4);
+    for (const int32_t bits : kMixdownBits) {
+        if (copy(&r, &w, 1) != 0) {
+            copy(&r, &w, bits);
+        }
+    }
+    for (uint32_t i = 0; i < front + side + back; ++i) {
+        copy(&r, &w, 5);
+    }
+    for (uint32_t i = 0; i < low + data_elements; ++i) {
+        copy(&r, &w, 4);
+    }
+    for (uint32_t i = 0; i < coupling; ++i) {
+        copy(&r, &w, 5);
+    }
+    r.at = (r.at + 7) / 8 * 8;
+    r.at += static_cast<int64_t>(get(&r, 8)) * 8;  // a comment, left out of the copy
+    w.at = (w.at + 7) / 8 * 8;
+    put(&w, 0, 8);
+    config->size = static_cast<int32_t>(w.at / 8);
+    return r.failed || r.at > r.bits ? -1 : r.at;
+}
+
+bool aac_config_read(aac_config *config, const void *data, int32_t bytes) {
+    *config = {};
+    if (data == nullptr || bytes < 2 || bytes > kAacMaxConfig) {
+        return false;
+    }
+    memcpy(config->bytes, data, static_cast<size_t>(bytes));
+    config->size = bytes;
+    bit_reader r = {config->bytes, static_cast<int64_t>(bytes) * 8, 0, false};
+    config->object_type = static_cast<int32_t>(get(&r, 5));
+    if (config->object_type == kObjectEscape) {
+        config->object_type = 32 + static_cast<int32_t>(get(&r, 6));
+    }
+    config->rate_index = static_cast<int32_t>(get(&r, 4));
+    if (config->rate_index == kRateEscape) {
+        get(&r, 24);
+    }
+    config->channels = static_cast<int32_t>(get(&r, 4));
+    config->short_frames = config->object_type == kAacLowComplexity && get(&r, 1) != 0;
+    return !r.failed;
+}
+
+void aac_config_make_sbr(aac_config *config, bool parametric) {
+    // The output's rate is twice the core's: three places up in the table.
+    const int32_t extension = config->rate_index - 3;
+    if (config->object_type != kAacLowComplexity || config->channels == 0 ||
+        aac_rate_of_index(extension) != 2 * aac_rate_of_index(config->rate_index)) {
+        return;
+    }
+    config->object_type = parametric ? kAacPs : kAacSbr;
+    memset(config->bytes, 0, sizeof config->bytes);
+    bit_writer w = {config->bytes, 0};
+    put_core(&w, *config);
+    put(&w, static_cast<uint32_t>(extension), 4);
+    put(&w, kAacLowComplexity, 5);
+    put_general(&w, *config);
+    config->size = static_cast<int32_t>((w.at + 7) / 8);
+}

@@ -1,0 +1,17 @@
+// AAC in ADIF form: one header, then raw blocks without any framing of their own. Where each block
+// ends is known only by decoding it.
+//
+// In: the file. Out: the configuration and the blocks' places, for aac_stream.h.
+#ifndef WEXAAUDIO_ADIF_SCAN_H
+#define WEXAAUDIO_ADIF_SCAN_H
+
+#include <cstdint>
+
+#include "desktop/wexaaudio/aac/aac_stream.h"
+
+// Fills s->config and s->index from the "ADIF" at offset start of s->file. Nothing is known behind
+// a damaged block: the stream ends before it. False when there is no block, on a read error and
+// when out of memory.
+bool adif_scan(aac_stream *s, int64_t start);
+
+#endif

@@ -1,0 +1,124 @@
+#include "desktop/wexaaudio/shared/io_file.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+
+namespace {
+
+// Reads up to count bytes at offset into buf through the callbacks. Returns the bytes read, -1 on
+// failure.
+int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
+    if (f->at != offset) {
+        f->at = -1;
+        if (f->io.seek(f->file, &offset) != 0) {
+            return -1;
+        }
+        f->at = offset;
+    }
+    int64_t done = 0;
+    while (done < count) {
+        const int64_t piece = std::min<int64_t>(count - done, 1 << 30);
+        const int64_t got = f->io.read(f->file, buf + done, static_cast<int32_t>(piece));
+        if (got < 0 || got > piece) {
+            f->at = -1;
+            return -1;
+        }
+        if (got == 0) {
+            break;
+        }
+        done += got;
+        f->at += got;
+    }
+    return done;
+}
+
+}  // namespace
+
+bool io_file_open(io_file *f, const mtsrc_io *io) {
+    *f = {};
+    if (io == nullptr || io->open == nullptr || io->close == nullptr || io->read == nullptr ||
+        io->seek == nullptr || io->size == nullptr) {
+        return false;
+    }
+    f->io = *io;
+    f->at = 0;
+    f->room = kIoBlock;
+    f->block = static_cast<uint8_t *>(malloc(kIoBlock));
+    f->file = f->block != nullptr ? io->open(io, 0) : nullptr;
+    if (f->file == nullptr || f->io.size(f->file, &f->size) != 0 || f->size < 0) {
+        io_file_close(f);
+        return false;
+    }
+    return true;
+}
+
+bool io_file_widen(io_file *f, int32_t look) {
+    if (look <= f->room / 2) {
+        return true;
+    }
+    void *grown =
+        look <= INT32_MAX / 2 ? realloc(f->block, static_cast<size_t>(look) * 2) : nullptr;
+    if (grown == nullptr) {
+        return false;
+    }
+    f->block = static_cast<uint8_t *>(grown);
+    f->room = look * 2;
+    return true;
+}
+
+void io_file_close(io_file *f) {
+    if (f->file != nullptr) {
+        f->io.close(f->file);
+    }
+    free(f->block);
+    *f = {};
+}
+
+const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *got) {
+    *got = 0;
+    if (offset < 0 || offset >= f->size || want > f->room / 2) {
+        return nullptr;
+    }
+    const int64_t want_end = std::min(offset + want, f->size);
+    if (offset < f->block_at || want_end > f->block_at + f->block_got ||
+        offset >= f->block_at + f->block_got) {
+        // What the block already holds of the place moves to its front and is not read again.
+        const int64_t held_end = f->block_at + f->block_got;
+        int32_t keep = 0;
+        if (offset >= f->block_at && offset < held_end) {
+            keep = static_cast<int32_t>(held_end - offset);
+            memmove(f->block, f->block + (offset - f->block_at), static_cast<size_t>(keep));
+        }
+        f->block_at = offset;
+        f->block_got = keep;
+        const int64_t more = read_raw(f, offset + keep, f->block + keep, f->room - keep);
+        if (more < 0) {
+            f->failed = true;
+            f->block_got = 0;
+            return nullptr;
+        }
+        f->block_got += static_cast<int32_t>(more);
+    }
+    *got = static_cast<int32_t>(f->block_at + f->block_got - offset);
+    return *got > 0 ? f->block + (offset - f->block_at) : nullptr;
+}
+
+int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count) {
+    if (offset < 0 || count < 0) {
+        return -1;
+    }
+    if (count > f->room / 2) {
+        const int64_t got = read_raw(f, offset, static_cast<uint8_t *>(buf), count);
+        f->failed = f->failed || got < 0;
+        return got;
+    }
+    int32_t held = 0;
+    const uint8_t *at = io_file_peek(f, offset, static_cast<int32_t>(count), &held);
+    if (at == nullptr) {
+        return f->failed ? -1 : 0;
+    }
+    const int64_t copied = std::min<int64_t>(count, held);
+    memcpy(buf, at, static_cast<size_t>(copied));
+    return copied;
+}

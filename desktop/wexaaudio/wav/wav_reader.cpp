@@ -1,0 +1,200 @@
+// RIFF WAVE with 16-bit linear PCM: chunks in any order, lying sizes, files beyond 4 GiB (RF64).
+//
+// In: mtsrc_io. Out: whole sample frames of interleaved PCM, the information record.
+#include <algorithm>
+#include <climits>
+#include <cstdlib>
+#include <cstring>
+
+#include "desktop/wexaaudio/shared/io_file.h"
+#include "desktop/wexaaudio/shared/units.h"
+#include "media_source/wexaaudio.h"
+
+namespace {
+
+constexpr int32_t kRiffHead = 12;         // bytes: "RIFF", size, "WAVE"
+constexpr int32_t kChunkHead = 8;         // bytes: name, size
+constexpr int32_t kFormatBytes = 16;      // least size of a "fmt " chunk
+constexpr int32_t kExtensibleBytes = 40;  // of an extensible one
+constexpr int32_t kSizesBytes = 16;       // of "ds64" up to the data size
+constexpr uint32_t kUnknownSize = 0xFFFFFFFF;
+constexpr int32_t kMaxChunks = 65536;  // a file that has more is no song
+constexpr int32_t kTagPcm = 1;
+constexpr int32_t kTagExtensible = 0xFFFE;
+constexpr int32_t kTagCollision = 0x10000;  // keeps a file's own tag 300 apart from kWexaPcm
+constexpr int32_t kSampleBytes = 2;
+
+// What follows the format tag in the sub-format of an extensible header.
+constexpr uint8_t kSubFormatTail[14] = {0, 0, 0, 0, 0x10, 0, 0x80, 0, 0, 0xAA, 0, 0x38, 0x9B, 0x71};
+
+struct wav_reader {
+    io_file file;
+    int64_t data;   // offset of the first sample frame
+    int64_t total;  // sample frames
+    int64_t next;   // sample frame read next
+    int32_t block;  // bytes of a sample frame
+    int32_t rate;   // Hz
+};
+
+struct wav_head {
+    bool has_format;
+    bool has_data;
+    int32_t tag;
+    int32_t channels;
+    int64_t rate;  // Hz, 32-bit unsigned in the file
+    int32_t bits;
+    int64_t data;        // offset
+    int64_t data_bytes;  // as present in the file
+    int64_t long_bytes;  // data size of "ds64", -1 without one
+};
+
+uint32_t le16(const uint8_t *p) {
+    return static_cast<uint32_t>(p[0] | p[1] << 8);
+}
+
+uint32_t le32(const uint8_t *p) {
+    return le16(p) | le16(p + 2) << 16;
+}
+
+void read_format(wav_head *head, const uint8_t *p, int64_t bytes) {
+    head->has_format = true;
+    head->tag = static_cast<int32_t>(le16(p));
+    head->channels = static_cast<int32_t>(le16(p + 2));
+    head->rate = le32(p + 4);
+    head->bits = static_cast<int32_t>(le16(p + 14));
+    if (head->tag == kTagExtensible && bytes >= kExtensibleBytes &&
+        memcmp(p + 26, kSubFormatTail, sizeof kSubFormatTail) == 0) {
+        head->tag = static_cast<int32_t>(le16(p + 24));
+    }
+}
+
+// A data size of nothing or of all ones was never filled in by its writer, and a file may be cut
+// short: the rest of the file is the data then.
+void read_data(wav_head *head, int64_t offset, uint32_t size, int64_t file_size) {
+    const int64_t rest = file_size - offset;
+    head->has_data = true;
+    head->data = offset;
+    head->data_bytes = rest;
+    if (size == kUnknownSize && head->long_bytes > 0) {
+        head->data_bytes = std::min(rest, head->long_bytes);
+    } else if (size != 0 && size != kUnknownSize) {
+        head->data_bytes = std::min<int64_t>(rest, size);
+    }
+}
+
+// Walks the chunks until both the format and the data are known. False on a read error or when the
+// file is not RIFF WAVE.
+bool read_chunks(io_file *f, wav_head *head) {
+    int32_t got = 0;
+    const uint8_t *p = io_file_peek(f, 0, kRiffHead, &got);
+    if (p == nullptr || got < kRiffHead || memcmp(p + 8, "WAVE", 4) != 0 ||
+        (memcmp(p, "RIFF", 4) != 0 && memcmp(p, "RF64", 4) != 0)) {
+        return false;
+    }
+    head->long_bytes = -1;
+    int64_t at = kRiffHead;
+    for (int32_t i = 0; i < kMaxChunks && !(head->has_format && head->has_data); ++i) {
+        p = io_file_peek(f, at, kChunkHead + kExtensibleBytes, &got);
+        if (p == nullptr || got < kChunkHead) {
+            return !f->failed;
+        }
+        const uint32_t size = le32(p + 4);
+        const int64_t body = std::min<int64_t>(got - kChunkHead, size);
+        if (memcmp(p, "fmt ", 4) == 0 && body >= kFormatBytes && !head->has_format) {
+            read_format(head, p + kChunkHead, body);
+        } else if (memcmp(p, "ds64", 4) == 0 && body >= kSizesBytes) {
+            const uint8_t *bytes = p + kChunkHead + 8;
+            const uint64_t wide = static_cast<uint64_t>(le32(bytes + 4)) << 32 | le32(bytes);
+            head->long_bytes = static_cast<int64_t>(std::min<uint64_t>(wide, INT64_MAX));
+        } else if (memcmp(p, "data", 4) == 0 && !head->has_data) {
+            read_data(head, at + kChunkHead, size, f->size);
+            at = head->data + head->data_bytes + (head->data_bytes & 1);
+            continue;
+        }
+        at += kChunkHead + static_cast<int64_t>(size) + (size & 1);
+    }
+    return true;
+}
+
+// Fills the record for the reasons of a refusal too. False when the header is too broken to say
+// anything: the record stays empty.
+bool fill_info(xwav_info *info, const wav_head *head) {
+    if (!head->has_format || head->channels == 0 || head->rate == 0 || head->rate > INT32_MAX) {
+        return false;
+    }
+    info->codec = head->tag == kTagPcm    ? kWexaPcm
+                  : head->tag == kWexaPcm ? head->tag | kTagCollision
+                                          : head->tag;
+    info->sample_rate = static_cast<int32_t>(head->rate);
+    info->bits = head->bits;
+    info->channels = head->channels;
+    return true;
+}
+
+}  // namespace
+
+void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t * /*word*/) {
+    wav_reader *reader = static_cast<wav_reader *>(calloc(1, sizeof(wav_reader)));
+    if (reader == nullptr || info == nullptr || !io_file_open(&reader->file, io)) {
+        free(reader);
+        return nullptr;
+    }
+    wav_head head = {};
+    if (!read_chunks(&reader->file, &head) || !fill_info(info, &head) || !head.has_data ||
+        info->codec != kWexaPcm || info->bits != kSampleBytes * CHAR_BIT) {
+        xwavd_delete(reader);
+        return nullptr;
+    }
+    reader->rate = info->sample_rate;
+    reader->block = head.channels * kSampleBytes;
+    reader->data = head.data;
+    reader->total = std::min(head.data_bytes / reader->block, kMaxSamples);
+    info->duration = units_of_duration(reader->total, reader->rate);
+    return reader;
+}
+
+int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
+                      int64_t *second) {
+    wav_reader *r = static_cast<wav_reader *>(reader);
+    if (r == nullptr || buf == nullptr || bytes == nullptr || size < r->block) {
+        return -1;
+    }
+    const int64_t frames = std::min<int64_t>(size / r->block, r->total - r->next);
+    if (frames <= 0) {
+        return 1;
+    }
+    const int64_t got =
+        io_file_read(&r->file, r->data + r->next * r->block, buf, frames * r->block);
+    if (got < r->block) {
+        return got < 0 ? -1 : 1;
+    }
+    const int64_t whole = got / r->block;
+    if (first != nullptr) {
+        *first = units_from_samples(r->next, r->rate);
+    }
+    if (second != nullptr) {
+        *second = units_from_samples(whole, r->rate);
+    }
+    r->next += whole;
+    *bytes = static_cast<int32_t>(whole * r->block);
+    return 0;
+}
+
+int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32_t /*flags*/) {
+    wav_reader *r = static_cast<wav_reader *>(reader);
+    if (r == nullptr || seconds == nullptr || reached == nullptr) {
+        return -1;
+    }
+    const int64_t wanted = std::max<int64_t>(*seconds, 0);
+    r->next = wanted > r->total / r->rate ? r->total : std::min(wanted * r->rate, r->total);
+    *reached = units_from_samples(r->next, r->rate);
+    return 0;
+}
+
+void xwavd_delete(void *reader) {
+    wav_reader *r = static_cast<wav_reader *>(reader);
+    if (r != nullptr) {
+        io_file_close(&r->file);
+        free(r);
+    }
+}

@@ -1,2 +1,0 @@
-set(jni_sources
-  tavo_jni.cpp)

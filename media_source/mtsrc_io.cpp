@@ -1,0 +1,122 @@
+#include "media_source/mtsrc_io.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+
+namespace {
+
+constexpr int32_t kModeReadWrite = 1;
+constexpr mode_t kPermissions = 0644;
+
+int open_path(const char *path, int32_t mode) {
+    const int flags = (mode & kModeReadWrite) ? O_RDWR | O_CREAT : O_RDONLY;
+    int fd;
+    do {
+        fd = open(path, flags | O_LARGEFILE | O_CLOEXEC, kPermissions);
+    } while (fd < 0 && errno == EINTR);
+    return fd;
+}
+
+bool usable(const mtsrc_file *file) {
+    return file && file->fd >= 0;
+}
+
+}  // namespace
+
+mtsrc_file *mtsrc_file_open(const mtsrc_io *io, int32_t mode) {
+    if (!io || !io->path) {
+        return nullptr;
+    }
+    auto *file = static_cast<mtsrc_file *>(malloc(sizeof(mtsrc_file)));
+    if (!file) {
+        return nullptr;
+    }
+    file->fd = strcmp(io->path, "fd") == 0 ? dup(io->fd) : open_path(io->path, mode);
+    if (file->fd < 0) {
+        free(file);
+        return nullptr;
+    }
+    // A duplicate shares its offset with the original. What cannot be positioned, a pipe say, fails
+    // at the first tell.
+    lseek64(file->fd, 0, SEEK_SET);
+    return file;
+}
+
+int32_t mtsrc_file_close(mtsrc_file *file) {
+    if (!file) {
+        return -1;
+    }
+    // No retry after EINTR: the descriptor is gone by then.
+    const int result = file->fd == -1 ? 0 : close(file->fd);
+    free(file);
+    return result == 0 ? 0 : -1;
+}
+
+int64_t mtsrc_file_read(mtsrc_file *file, void *buf, int32_t count) {
+    if (!usable(file) || count < 0) {
+        return -1;
+    }
+    // A file system may deliver less than there is (a network's, when a signal arrives): only the
+    // file's end or a failure ends a read early, and a failure behind some bytes shows in the next.
+    int64_t done = 0;
+    ssize_t got;
+    do {
+        got = read(file->fd, static_cast<char *>(buf) + done, static_cast<size_t>(count - done));
+        done += got > 0 ? got : 0;
+    } while (done < count && (got > 0 || (got < 0 && errno == EINTR)));
+    return got < 0 && done == 0 ? -1 : done;
+}
+
+int64_t mtsrc_file_write(mtsrc_file *file, const void *buf, int32_t count) {
+    if (!usable(file) || count < 0) {
+        return -1;
+    }
+    ssize_t written;
+    do {
+        written = write(file->fd, buf, static_cast<size_t>(count));
+    } while (written < 0 && errno == EINTR);
+    return written;
+}
+
+int32_t mtsrc_file_tell(mtsrc_file *file, int64_t *offset) {
+    if (!usable(file) || !offset) {
+        return -1;
+    }
+    const int64_t now = lseek64(file->fd, 0, SEEK_CUR);
+    if (now < 0) {
+        return -1;
+    }
+    *offset = now;
+    return 0;
+}
+
+int32_t mtsrc_file_seek(mtsrc_file *file, const int64_t *offset) {
+    if (!usable(file) || !offset) {
+        return -1;
+    }
+    return lseek64(file->fd, *offset, SEEK_SET) < 0 ? -1 : 0;
+}
+
+int32_t mtsrc_file_skip(mtsrc_file *file, const int64_t *distance) {
+    if (!usable(file) || !distance || *distance < 1) {
+        return -1;
+    }
+    return lseek64(file->fd, *distance, SEEK_CUR) < 0 ? -1 : 0;
+}
+
+int32_t mtsrc_file_size(mtsrc_file *file, int64_t *length) {
+    int64_t now = 0;
+    if (!length || mtsrc_file_tell(file, &now) != 0) {
+        return -1;
+    }
+    const int64_t end = lseek64(file->fd, 0, SEEK_END);
+    if (mtsrc_file_seek(file, &now) != 0 || end < 0) {
+        return -1;
+    }
+    *length = end;
+    return 0;
+}

@@ -1,9 +1,0 @@
-set(pcm_sources
-  decode_plan.cpp
-  read_pcm.cpp
-  decode_run.cpp
-  stitch.cpp
-  from_highlight.cpp
-  resample.cpp
-  resample_block.cpp
-  resample_sinc.cpp)

@@ -1,2 +1,0 @@
-set(platform_sources
-  worker_group.cpp)

@@ -1,0 +1,253 @@
+#include "tests/desktop/codec_test.h"
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <iterator>
+
+namespace codec_test {
+
+namespace {
+
+constexpr int32_t kRequest = 8192;          // bytes, the pipeline's own
+constexpr ptrdiff_t kSeamSamples = 30'000;  // compared behind each seek
+constexpr size_t kSeams = 40;
+
+// Files that the running program saved; removed when it ends.
+struct saved_files {
+    std::vector<std::string> paths;
+    ~saved_files() {
+        for (const std::string &path : paths) unlink(path.c_str());
+    }
+} saved;
+
+}  // namespace
+
+std::string fixture(const std::string &name) {
+    return std::string(CODEC_FIXTURES) + "/" + name;
+}
+
+bytes load(const std::string &path) {
+    std::ifstream in(path, std::ios::binary);
+    bytes contents{std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+    EXPECT_FALSE(contents.empty()) << path;
+    return contents;
+}
+
+std::string save(const std::string &name, const bytes &contents) {
+    const std::string path = testing::TempDir() + "tavo_" + std::to_string(getpid()) + "_" + name;
+    std::ofstream out(path, std::ios::binary);
+    out.write(reinterpret_cast<const char *>(contents.data()),
+              static_cast<std::streamsize>(contents.size()));
+    EXPECT_TRUE(out.good()) << path;
+    saved.paths.push_back(path);
+    return path;
+}
+
+bytes part(const bytes &file, size_t from, size_t to) {
+    return {file.begin() + static_cast<ptrdiff_t>(from),
+            file.begin() + static_cast<ptrdiff_t>(std::min(to, file.size()))};
+}
+
+bytes joined(const std::vector<bytes> &pieces) {
+    bytes file;
+    for (const bytes &piece : pieces) file.insert(file.end(), piece.begin(), piece.end());
+    return file;
+}
+
+bytes noise(size_t size) {
+    std::mt19937 random(5);
+    bytes out(size);
+    std::generate(out.begin(), out.end(), [&] { return static_cast<uint8_t>(random()); });
+    return out;
+}
+
+opened::opened(const std::string &path) {
+    const mtsrc_param param = {path.c_str()};
+    source = mtsrc_init(&param, &error);
+    if (source != nullptr) {
+        EXPECT_EQ(mtsrc_getstream_format(source, &format), 0);
+    }
+}
+
+opened::~opened() {
+    if (source != nullptr) {
+        EXPECT_EQ(mtsrc_deinit(source), -5);
+    }
+}
+
+samples read(mtsrc_ctx *source, size_t limit) {
+    samples all;
+    samples piece(kRequest / 2);
+    bool ended = false;
+    while (!ended && all.size() < limit) {
+        mtsrc_frame frame = {piece.data(), 0};
+        const int32_t code = mtsrc_getstream(source, kRequest, &frame);
+        if (code != 0 && code != 1) {
+            ADD_FAILURE() << "reading failed with " << code;
+            break;
+        }
+        ended = code == 1;
+        all.insert(all.end(), piece.begin(), piece.begin() + frame.size / 2);
+    }
+    all.resize(std::min(all.size(), limit));
+    return all;
+}
+
+samples read_all(const std::string &path) {
+    opened file(path);
+    EXPECT_NE(file.source, nullptr) << path << ": " << file.error;
+    return file.source != nullptr ? read(file.source, SIZE_MAX) : samples{};
+}
+
+void expect_same(const samples &got, const samples &wanted) {
+    ASSERT_EQ(got.size(), wanted.size());
+    const auto differs = std::mismatch(got.begin(), got.end(), wanted.begin()).first;
+    EXPECT_EQ(differs - got.begin(), static_cast<ptrdiff_t>(got.size())) << "the first to differ";
+}
+
+void expect_changed(const samples &whole, const std::vector<changed_file> &files) {
+    for (const changed_file &each : files) {
+        SCOPED_TRACE(each.name);
+        const std::string path = save("changed", each.contents);
+        const samples got = read_all(path);
+        ASSERT_EQ(got.size(), each.size);
+        const auto at = [](const samples &all, size_t sample) {
+            return all.begin() + static_cast<ptrdiff_t>(sample);
+        };
+        expect_same({got.begin(), at(got, each.same_until)},
+                    {whole.begin(), at(whole, each.same_until)});
+        if (each.same_from != changed_file::kNever) {
+            const size_t behind = whole.size() - each.same_from;
+            expect_same({at(got, got.size() - behind), got.end()},
+                        {at(whole, each.same_from), whole.end()});
+        }
+        expect_same({at(got, each.silent_from), at(got, each.silent_until)},
+                    samples(each.silent_until - each.silent_from));
+        if (each.exact_seams) expect_exact_seams(path);
+    }
+}
+
+void expect_exact_seams(const std::string &path) {
+    SCOPED_TRACE(path);
+    const samples linear = read_all(path);
+    opened file(path);
+    ASSERT_NE(file.source, nullptr) << file.error;
+    ASSERT_GT(linear.size(), 0U);
+    const int64_t rate = file.format.sample_rate;
+    const int64_t duration = file.format.duration;
+    EXPECT_EQ(duration * rate / kUnits, static_cast<int64_t>(linear.size()));
+    // The stream's edges, the inside of the first frames, the last quarter, then anywhere.
+    std::vector<int64_t> places = {
+        0,        1,           227,         100'000,          133'000,
+        200'000,  300'000,     kUnits / 50, duration / 4 * 3, duration - 1,
+        duration, 2 * duration};
+    std::mt19937_64 random(7);
+    while (places.size() < kSeams) {
+        places.push_back(static_cast<int64_t>(random() % static_cast<uint64_t>(duration)));
+    }
+    for (const int64_t position : places) {
+        SCOPED_TRACE("seek to " + std::to_string(position));
+        int64_t reached = -1;
+        ASSERT_EQ(mtsrc_seekstream(file.source, position, &reached), 0);
+        const int64_t sample = reached * rate / kUnits;
+        const int64_t left = static_cast<int64_t>(linear.size()) - sample;
+        ASSERT_GE(left, 0);
+        // A position lies at most one sample before the one reached, but for the stream's end.
+        ASSERT_TRUE(reached >= position || left == 0) << reached;
+        ASSERT_LT(std::max<int64_t>(reached - position - 1, 0) * rate, kUnits) << reached;
+        int64_t again = -1;
+        ASSERT_EQ(mtsrc_seekstream(file.source, reached, &again), 0);
+        ASSERT_EQ(again, reached);
+        const auto from = linear.begin() + sample;
+        const samples wanted(from, from + std::min<ptrdiff_t>(left, kSeamSamples));
+        ASSERT_NO_FATAL_FAILURE(expect_same(read(file.source, kSeamSamples), wanted));
+        if (position == duration / 4 * 3) {
+            EXPECT_LE(2 * left, duration / 4 * 2 * rate / kUnits);
+        }
+    }
+}
+
+bytes damaged(bytes file, std::mt19937 &random) {
+    const auto below = [&](size_t limit) { return random() % std::max<size_t>(limit, 1); };
+    const size_t wounds = 1 + below(20);
+    const bool head_only = below(3) == 0;
+    for (size_t i = 0; i < wounds && file.size() > 64; ++i) {
+        const size_t at = below(head_only ? 512 : file.size());
+        const size_t run =
+            std::min(1 + below(i % 2 == 0 ? 8 : 4000), file.size() - std::min(at, file.size()));
+        const auto from = file.begin() + static_cast<ptrdiff_t>(std::min(at, file.size()));
+        const auto to = from + static_cast<ptrdiff_t>(run);
+        switch (below(7)) {
+            case 0:
+                std::for_each(from, to,
+                              [&](uint8_t &b) { b = static_cast<uint8_t>(b ^ 1 << below(8)); });
+                break;
+            case 1:
+                std::generate(from, to, [&] { return static_cast<uint8_t>(random()); });
+                break;
+            case 2:
+                std::fill(from, to, uint8_t{0});
+                break;
+            case 3:
+                std::fill(from, to, uint8_t{0xFF});
+                break;
+            case 4:
+                file.erase(from, to);
+                break;
+            case 5: {
+                const bytes piece(from, to);
+                const auto place = file.begin() + static_cast<ptrdiff_t>(below(file.size()));
+                file.insert(place, piece.begin(), piece.end());
+                break;
+            }
+            default:
+                file.resize(file.size() -
+                            std::min(file.size() - 1, below(i == 0 ? file.size() : 64)));
+        }
+    }
+    return file;
+}
+
+bool reads_consistently(const std::string &path, std::mt19937 &random) {
+    opened file(path);
+    if (file.source == nullptr) {
+        EXPECT_LT(file.error, 0);
+        return false;
+    }
+    const int64_t rate = file.format.sample_rate;
+    const int64_t duration = file.format.duration;
+    EXPECT_GE(duration, 0);
+    const samples linear = read(file.source, SIZE_MAX);
+    EXPECT_EQ(duration * rate / kUnits, static_cast<int64_t>(linear.size()));
+    for (int k = 0; k < 4; ++k) {
+        const int64_t position =
+            static_cast<int64_t>(random() % static_cast<uint64_t>(duration + kUnits));
+        int64_t reached = -1;
+        EXPECT_EQ(mtsrc_seekstream(file.source, position, &reached), 0);
+        EXPECT_GE(reached, 0);
+        EXPECT_LE(reached, std::max(position, duration));
+        const size_t sample = static_cast<size_t>(reached * rate / kUnits);
+        EXPECT_EQ(sample + read(file.source, SIZE_MAX).size(), linear.size());
+    }
+    return true;
+}
+
+mtsrc_io io_for(const std::string &path) {
+    mtsrc_io io = {};
+    io.open = mtsrc_file_open;
+    io.close = mtsrc_file_close;
+    io.read = mtsrc_file_read;
+    io.write = mtsrc_file_write;
+    io.tell = mtsrc_file_tell;
+    io.seek = mtsrc_file_seek;
+    io.skip = mtsrc_file_skip;
+    io.size = mtsrc_file_size;
+    io.path = const_cast<char *>(path.c_str());  // read only by open
+    return io;
+}
+
+}  // namespace codec_test
