@@ -183,11 +183,7 @@ void _thd_cleanup(void *record) {
 }
 
 void *_tavo_proc_onsetenv(void *record) {
-    pthread_cleanup_push(_thd_cleanup, record);
-    run_onset_worker(record);
-    pthread_exit(nullptr);
-    pthread_cleanup_pop(0);
-    return nullptr;
+    run_worker(record, run_onset_worker, _thd_cleanup);
 }
 
 void _getOnsetEnvelope(TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size) {

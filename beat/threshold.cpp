@@ -152,11 +152,7 @@ void _thd_thres_cleanup(void *record) {
 }
 
 void *_tavo_proc_beatcandi(void *record) {
-    pthread_cleanup_push(_thd_thres_cleanup, record);
-    run_thres_worker(record);
-    pthread_exit(nullptr);
-    pthread_cleanup_pop(0);
-    return nullptr;
+    run_worker(record, run_thres_worker, _thd_thres_cleanup);
 }
 
 int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, double *thr) {

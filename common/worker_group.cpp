@@ -15,6 +15,13 @@ bool all_done(const int32_t *done, int32_t count) {
 
 }  // namespace
 
+void run_worker(void *record, void (*body)(void *), void (*cleanup)(void *)) {
+    pthread_cleanup_push(cleanup, record);
+    body(record);
+    pthread_exit(nullptr);
+    pthread_cleanup_pop(0);
+}
+
 void worker_group_done(pthread_mutex_t *mutex, pthread_cond_t *cond, int32_t *done, int32_t count,
                        int32_t index) {
     pthread_mutex_lock(mutex);

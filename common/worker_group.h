@@ -19,6 +19,10 @@ struct worker_slot {
     void (*body)(void *record);    // the work alone, for a worker whose thread cannot be started
 };
 
+// The whole of a worker's thread entry: pushes cleanup, the group's completion handler, runs the
+// body and ends the thread. Both are called with the record.
+[[noreturn]] void run_worker(void *record, void (*body)(void *), void (*cleanup)(void *));
+
 // Completion handler's body: under the mutex sets done[index] to 1 and signals the condition when
 // all count flags are set.
 void worker_group_done(pthread_mutex_t *mutex, pthread_cond_t *cond, int32_t *done, int32_t count,

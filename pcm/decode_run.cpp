@@ -21,10 +21,7 @@ void thd_cleanup(void *seg) {
 }
 
 void *_tavo_mtproc_decoding(void *seg) {
-    pthread_cleanup_push(thd_cleanup, seg);
-    decode_segment(seg);
-    pthread_exit(nullptr);
-    pthread_cleanup_pop(0);
+    run_worker(seg, decode_segment, thd_cleanup);
 }
 
 int64_t DecodePcmMT(TAVO_CTX *ctx, void *dst, int64_t dst_capacity) {

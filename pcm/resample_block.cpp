@@ -43,10 +43,7 @@ void resampleMT_thd_cleanup(void *part) {
 }
 
 void *_resampleMT(void *part) {
-    pthread_cleanup_push(resampleMT_thd_cleanup, part);
-    average_part(part);
-    pthread_exit(nullptr);
-    pthread_cleanup_pop(0);
+    run_worker(part, average_part, resampleMT_thd_cleanup);
 }
 
 void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, double *out,

@@ -60,10 +60,7 @@ void report(void *record) {
 }
 
 void *enter(void *record) {
-    pthread_cleanup_push(report, record);
-    work(record);
-    pthread_exit(nullptr);
-    pthread_cleanup_pop(0);
+    run_worker(record, work, report);
 }
 
 TEST(worker_group, every_worker_runs_once_whatever_can_be_started) {
