@@ -1,4 +1,5 @@
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include <chrono>
 #include <cstring>
@@ -22,7 +23,8 @@ TAVO_CTX *create(int32_t mode) {
         plan.rate = 22050;
         plan.loud_at = 8.0;
         plan.tail_at = 22.0;
-        const std::string name = testing::TempDir() + "tavo_lifecycle.wav";
+        const std::string name =
+            testing::TempDir() + "tavo_lifecycle" + std::to_string(getpid()) + ".wav";
         EXPECT_TRUE(support::write_wav(name, support::make_song(plan)));
         return name;
     }();
