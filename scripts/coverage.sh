@@ -10,7 +10,7 @@ build=${TAVO_COVERAGE_BUILD:-build/coverage}
 
 for tool in cmake ninja g++ gcov gcovr ffmpeg; do
   command -v "$tool" >/dev/null ||
-    { echo "coverage: $tool is missing: run scripts/setup.sh build tests measure" >&2; exit 1; }
+    { echo "coverage: $tool is missing: run scripts/setup.sh build java tests measure" >&2; exit 1; }
 done
 
 cmake --preset coverage -B "$build" >/dev/null

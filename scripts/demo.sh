@@ -9,7 +9,7 @@ fi
 file=${1:+$(realpath -- "$1")}
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 
-bash scripts/setup.sh
+bash scripts/setup.sh build
 quietly() {
   local log
   log=$(mktemp)
@@ -21,14 +21,16 @@ quietly() {
   rm -f "$log"
 }
 echo "Building (a minute or two the first time) ..."
-quietly cmake --preset release
-quietly cmake --build --preset release --target tavo_command make_song
+quietly cmake --preset release -DTAVO_BUILD_TESTS=OFF -DTAVO_BUILD_JNI=OFF
+quietly cmake --build --preset release --target tavo_command
 bin=build/release/bin
 
 if [[ -z $file ]]; then
   file=build/release/sample.wav
   echo "Making a sample song:"
-  "$bin/make_song" "$file" --seconds 90 --bpm 120 --loud-at 30
+  quietly g++ -std=c++17 -O2 -I. -o build/make_song \
+    tests/support/make_song.cpp tests/support/song.cpp tests/support/song_wav.cpp
+  build/make_song "$file" --seconds 90 --bpm 120 --loud-at 30
 fi
 
 show() {

@@ -39,7 +39,7 @@ for line in "${targets[@]}"; do
   shares=$((shares + share))
 done
 
-bash scripts/setup.sh build fuzz
+bash scripts/setup.sh build java fuzz
 cmake --preset fuzz >/dev/null
 cmake --build --preset fuzz
 mkdir -p build/fuzz/{work,findings,logs}

@@ -32,7 +32,7 @@ done
 [[ $chosen != " " ]] || chosen=" ${builds[*]%% *} "
 for tool in cmake ninja g++ clang++ valgrind ffmpeg flac lame oggenc; do
   command -v "$tool" >/dev/null ||
-    { echo "matrix: $tool is missing: run scripts/setup.sh build tests measure" >&2; exit 1; }
+    { echo "matrix: $tool is missing: run scripts/setup.sh build java tests measure" >&2; exit 1; }
 done
 
 export ASAN_OPTIONS=detect_leaks=1 UBSAN_OPTIONS=print_stacktrace=1

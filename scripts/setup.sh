@@ -1,15 +1,15 @@
 #!/usr/bin/env bash
-# scripts/setup.sh [build|tests|fuzz|measure|package]...
-# Installs the Debian packages that are missing, for building and testing by default. Says nothing
-# when none is.
+# scripts/setup.sh [build|java|tests|fuzz|measure|package]...
+# Installs the Debian packages that are missing: build, java, tests and fuzz by default; build alone
+# is enough for the library and the command. Says nothing when none is missing.
 set -euo pipefail
 
 build=(
   g++ cmake ninja-build pkg-config
   libavcodec-dev libavformat-dev libavutil-dev libogg-dev
   libcli11-dev nlohmann-json3-dev
-  default-jdk-headless
 )
+java=(default-jdk-headless) # the bridge and the class for Java hosts
 tests=(
   libgtest-dev libbenchmark-dev
   python3 clang-format
@@ -21,15 +21,16 @@ measure=(clang libclang-rt-14-dev gcovr valgrind)
 package=(dpkg-dev file debootstrap) # scripts/test-package.sh
 
 wanted=()
-for group in "${@:-build tests fuzz}"; do
+for group in "${@:-build java tests fuzz}"; do
   for name in $group; do
     case $name in
       build) wanted+=("${build[@]}") ;;
+      java) wanted+=("${java[@]}") ;;
       tests) wanted+=("${tests[@]}") ;;
       fuzz) wanted+=("${fuzz[@]}") ;;
       measure) wanted+=("${measure[@]}") ;;
       package) wanted+=("${package[@]}") ;;
-      *) echo "setup: no group '$name'; groups: build, tests, fuzz, measure, package" >&2; exit 2 ;;
+      *) echo "setup: no group '$name'; groups: build, java, tests, fuzz, measure, package" >&2; exit 2 ;;
     esac
   done
 done
@@ -48,7 +49,7 @@ done
 
 if [[ $(id -u) -ne 0 ]]; then
   echo "setup: these packages are missing and only root can install them:" >&2
-  echo "  sudo apt-get install --no-install-recommends ${missing[*]}" >&2
+  echo "  sudo apt-get update && sudo apt-get install --no-install-recommends ${missing[*]}" >&2
   exit 1
 fi
 
@@ -56,7 +57,24 @@ echo "setup: installing ${missing[*]}" >&2
 log=$(mktemp)
 trap 'rm -f "$log"' EXIT
 export DEBIAN_FRONTEND=noninteractive
-if ! { apt-get update && apt-get install -y --no-install-recommends "${missing[@]}"; } >"$log" 2>&1; then
+progress() { # of apt-get: every step on a terminal, every 50th elsewhere
+  local every=50
+  [[ -t 2 ]] && every=1
+  awk -v every=$every '
+    function step(name, count) {
+      if (count % every == 0 || count == total)
+        printf("%ssetup: %s %d of %d%s", every == 1 ? "\r" : "", name, count, total,
+               every == 1 ? "\033[K" : "\n")
+      fflush()
+    }
+    / newly installed/ { total = $3 }
+    /^Get:/ { step("downloading", ++got) }
+    /^Unpacking / { step("unpacking", ++unpacked) }
+    /^Setting up / { step("configuring", ++done) }
+    END { if (every == 1 && total > 0) printf("\n") }' >&2
+}
+if ! { apt-get update >"$log" 2>&1 &&
+  apt-get install -y --no-install-recommends "${missing[@]}" 2>&1 | tee -a "$log" | progress; }; then
   tail -n 20 "$log" >&2
   echo "setup: the packages could not be installed" >&2
   exit 1

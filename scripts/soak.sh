@@ -20,7 +20,7 @@ while [[ $# -gt 0 ]]; do
 done
 [[ ${#chosen[@]} -gt 0 ]] || chosen=("${steps[@]}")
 
-bash scripts/setup.sh build tests fuzz measure
+bash scripts/setup.sh build java tests fuzz measure
 mkdir -p build/soak docs/figures
 
 trial() { # trial PRESET PROGRAM: all cases of a trial program in its full tier

@@ -9,7 +9,7 @@ if [[ $(id -u) -ne 0 ]]; then
   echo "test-package: only root can make a system to install into" >&2
   exit 1
 fi
-bash scripts/setup.sh build tests package
+bash scripts/setup.sh build java tests package
 
 build=$PWD/build/package
 rm -rf "$build/packages"

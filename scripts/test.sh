@@ -13,7 +13,7 @@ sources=$(git ls-files '*.cpp' '*.h' '*.c' 2>/dev/null) || sources=""
 [[ -n $sources ]] || sources=$(find . -path ./build -prune -o -name '*.cpp' -print -o -name '*.[ch]' -print)
 xargs -d '\n' clang-format --dry-run --Werror <<<"$sources"
 
-failed=()
+failed=() # steps, and the tests in them
 for preset in release asan tsan; do
   echo "== $preset: build"
   cmake --preset "$preset" >/dev/null
@@ -23,9 +23,11 @@ echo "== fuzzers"
 bash scripts/fuzz.sh --seconds 3 || failed+=("fuzzers")
 for preset in release asan tsan; do
   echo "== $preset: tests"
-  ctest --preset "$preset" --parallel "$(nproc)" || failed+=("$preset")
+  ctest --preset "$preset" --parallel "$(nproc)" ||
+    failed+=("$preset: $(cut -d: -f2- "build/$preset/Testing/Temporary/LastTestsFailed.log" | paste -sd ' ')")
 done
 if [[ ${#failed[@]} -gt 0 ]]; then
-  echo "tests failed in: ${failed[*]}" >&2
+  echo "failed:" >&2
+  printf '  %s\n' "${failed[@]}" >&2
   exit 1
 fi

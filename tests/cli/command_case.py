@@ -2,7 +2,6 @@
 import json
 import os
 import pathlib
-import pwd
 import resource
 import shutil
 import struct
@@ -44,12 +43,9 @@ def wav(seconds=2.0, rate=44100, channels=1, bits=16, tag=1, data_size=None, sam
     return head + b"data" + struct.pack("<I", size) + data
 
 
-def nobody():
-    """Options of a run: as a user who may not do everything."""
-    if os.getuid() != 0:
-        return {}
-    user = pwd.getpwnam("nobody")
-    return {"user": user.pw_uid, "group": user.pw_gid, "extra_groups": []}
+# Words before a command that make root obey file permissions.
+AS_ORDINARY_USER = [] if os.getuid() != 0 else [
+    "setpriv", "--inh-caps=-all", "--bounding-set=-dac_override,-dac_read_search"]
 
 
 def file_limit(size):
@@ -83,11 +79,11 @@ class Case(unittest.TestCase):
         """The folder holds these files and nothing else, hidden ones counted."""
         self.assertEqual({p.name for p in self.folder.iterdir()}, set(names))
 
-    def run_tavo(self, *arguments, status=0, **options):
+    def run_tavo(self, *arguments, status=0, before=(), **options):
         """Runs in the case's folder; arguments may be bytes. Output is bytes."""
         if "input" not in options:
             options["stdin"] = subprocess.DEVNULL
-        done = subprocess.run([TAVO, *arguments], capture_output=True, cwd=self.folder,
+        done = subprocess.run([*before, TAVO, *arguments], capture_output=True, cwd=self.folder,
                               timeout=250, **options)
         self.assertEqual(done.returncode, status, (arguments, done.stdout, done.stderr))
         return done

@@ -1,7 +1,7 @@
 """Files that cannot be used: a clear sentence, exit status 1, and nothing of a result."""
 import os
 
-from command_case import Case, nobody, wav
+from command_case import AS_ORDINARY_USER, Case, wav
 
 ASF = bytes.fromhex("3026b2758e66cf11a6d900aa0062ce6c")
 
@@ -53,7 +53,7 @@ class Unusable(Case):
         os.chmod(self.folder / "closed", 0)
         self.addCleanup(os.chmod, self.folder / "closed", 0o700)
         names = ["secret.wav", "closed", "closed/in.wav"]
-        results = self.run_json(*names, status=1, **nobody())
+        results = self.run_json(*names, status=1, before=AS_ORDINARY_USER)
         self.assertEqual([r["file"] for r in results], names)
         for result in results:
             self.assertIn("permission denied", result["error"])

@@ -9,7 +9,7 @@ import sys
 import tempfile
 import unittest
 
-MAKE_SONG, BUILD, CMAKE, CC, CXX, VERSION, LIBDIR = (sys.argv.pop(1) for _ in range(7))
+MAKE_SONG, BUILD, CMAKE, GENERATOR, CC, CXX, VERSION, LIBDIR = (sys.argv.pop(1) for _ in range(8))
 SONAME = "libtavo.so." + VERSION.split(".", maxsplit=1)[0]
 STRICT = ["-Wall", "-Wextra", "-Wpedantic", "-Werror"]
 MEDIA_SOURCE = """
@@ -72,7 +72,7 @@ class Installed(unittest.TestCase):
 
     def test_example(self):
         build = self.folder / "build"
-        run(CMAKE, "-S", self.examples, "-B", build, f"-DCMAKE_C_COMPILER={CC}",
+        run(CMAKE, "-S", self.examples, "-B", build, "-G", GENERATOR, f"-DCMAKE_C_COMPILER={CC}",
             f"-DCMAKE_PREFIX_PATH={self.prefix}")
         run(CMAKE, "--build", build)
         program = self.build(CC, self.examples / "analyze_file.c", "-std=c99")
@@ -97,8 +97,8 @@ class Installed(unittest.TestCase):
             "cmake_minimum_required(VERSION 3.16)\nproject(other C)\n"
             "find_package(tavo 999 QUIET)\nmessage(STATUS \"found ${tavo_FOUND}\")\n"
             "find_package(tavo QUIET)\nmessage(STATUS \"version ${tavo_VERSION}\")\n")
-        said = run(CMAKE, "-S", project, "-B", project / "build", f"-DCMAKE_C_COMPILER={CC}",
-                   f"-DCMAKE_PREFIX_PATH={self.prefix}")
+        said = run(CMAKE, "-S", project, "-B", project / "build", "-G", GENERATOR,
+                   f"-DCMAKE_C_COMPILER={CC}", f"-DCMAKE_PREFIX_PATH={self.prefix}")
         self.assertIn("found 0", said)
         self.assertIn(f"version {VERSION}\n", said)
 

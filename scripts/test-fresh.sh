@@ -1,0 +1,53 @@
+#!/usr/bin/env bash
+# scripts/test-fresh.sh [COMMAND]...
+# Before a release, as root, an hour or more: makes a bare Debian 12 root, clones the last commit into
+# it under /root and runs what the README tells a newcomer to run, or the COMMANDs instead. Mounts
+# nothing of this machine: /proc is a new one, /dev holds a few new device nodes.
+set -euo pipefail
+cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
+if [[ $(id -u) -ne 0 ]]; then
+  echo "test-fresh: only root can make a system of its own" >&2
+  exit 1
+fi
+[[ $# -gt 0 ]] || set -- "bash scripts/demo.sh" "bash scripts/test.sh"
+bash scripts/setup.sh package
+
+root=$(mktemp -d)
+log=$root.log
+remove_root() {
+  if mountpoint -q "$root/proc"; then umount "$root/proc" || true; fi
+  if grep -qF " $root/" /proc/self/mountinfo; then
+    echo "test-fresh: something is still mounted below $root, which therefore stays" >&2
+  else
+    rm -rf --one-file-system "$root" "$log"
+  fi
+}
+trap remove_root EXIT
+chmod 755 "$root"
+
+echo "== a bare system"
+debootstrap --variant=minbase --include=git,ca-certificates bookworm "$root" >"$log" 2>&1 ||
+  { tail -n 20 "$log" >&2; exit 1; }
+mountpoint -q "$root/proc" || mount -t proc proc "$root/proc"
+find "$root/dev" -mindepth 1 -xdev -delete
+while read -r name major minor; do
+  mknod -m 666 "$root/dev/$name" c "$major" "$minor"
+done <<'END'
+null 1 3
+zero 1 5
+full 1 7
+random 1 8
+urandom 1 9
+tty 5 0
+END
+ln -s /proc/self/fd "$root/dev/fd"
+
+git clone --quiet --no-hardlinks . "$root/root/tavo"
+git -C "$root/root/tavo" checkout --quiet --detach "$(git rev-parse HEAD)"
+for command in "$@"; do
+  echo "== $command"
+  SECONDS=0
+  env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin HOME=/root \
+    chroot "$root" sh -c "cd /root/tavo && $command"
+  echo "== $command: well, $SECONDS s"
+done
