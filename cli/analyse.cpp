@@ -117,7 +117,7 @@ record analyse(const std::string &path, const options &how, int stop_fd) {
     if (!out.error.empty()) return out;
 
     click_file click;
-    out.error = begin_click(click, how.click, path);
+    out.error = begin_click(click, how.click, path, how.force);
     if (!out.error.empty()) return out;
 
     library_path opened = open_library_path(path);

@@ -33,7 +33,8 @@ bool is_whole_track(const std::string &path) {
 
 }  // namespace
 
-std::string begin_click(click_file &click, const std::string &target, const std::string &input) {
+std::string begin_click(click_file &click, const std::string &target, const std::string &input,
+                        bool force) {
     fnamedec = "";
     if (target.empty()) return "";
     if (same_file(target, input)) {
@@ -52,7 +53,9 @@ std::string begin_click(click_file &click, const std::string &target, const std:
         fnamedec = click.direct.c_str();
         return "";
     }
-    const std::string error = begin_output(click.file, target);
+    click.force = force;
+    std::string error = check_target(target, force);
+    if (error.empty()) error = begin_output(click.file, target);
     if (error.empty()) fnamedec = click.file.temporary.c_str();
     return error;
 }
@@ -64,7 +67,7 @@ std::string finish_click(click_file &click, bool analysed) {
         abandon_output(click.file);
         return "";
     }
-    if (is_whole_track(click.file.temporary)) return commit_output(click.file, true);
+    if (is_whole_track(click.file.temporary)) return commit_output(click.file, click.force);
     abandon_output(click.file);
     return "The click track " + shown(click.file.target) +
            " could not be written whole; the disk may be full.";

@@ -11,11 +11,14 @@ struct click_file {
     output_file file;    // its temporary is what the library writes
     std::string direct;  // instead of file, when the target is no regular file
     bool wanted = false;
+    bool force = false;  // overwrites an existing track
 };
 
 // Points fnamedec at the place for the target, at an empty path when target is empty. input: the
-// file to analyse, which the click track must not replace. Returns an empty string or what failed.
-std::string begin_click(click_file &click, const std::string &target, const std::string &input);
+// file to analyse, which the click track must not replace. An existing file is refused without
+// force. Returns an empty string or what failed.
+std::string begin_click(click_file &click, const std::string &target, const std::string &input,
+                        bool force);
 
 // After the job: puts a complete track in place, removes an incomplete one. Returns as above.
 std::string finish_click(click_file &click, bool analysed);

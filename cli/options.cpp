@@ -90,7 +90,8 @@ void declare_output(CLI::App &app, options &out, words &read) {
     app.add_option("-o,--output-dir", out.output_dir,
                    "Folder for the label tracks, else beside each file")
         ->type_name("DIR");
-    app.add_flag("--force", out.force, "Overwrite label tracks and pictures that exist");
+    app.add_flag("--force", out.force,
+                 "Overwrite label tracks, click tracks and pictures\nthat exist");
     app.add_option("--click", out.click,
                    "Write the sound with a click on every beat, a WAV file;\none input only")
         ->type_name("WAV");

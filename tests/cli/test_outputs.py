@@ -5,7 +5,7 @@ import struct
 import subprocess
 import time
 
-from command_case import TAVO, Case, file_limit, nobody, short_song, standard_song, wav
+from command_case import AS_ORDINARY_USER, TAVO, Case, file_limit, short_song, standard_song, wav
 
 # What writes which file for song.wav.
 LABELS = (["--format", "labels"], "song.wav.labels.txt")
@@ -52,15 +52,16 @@ class Outputs(Case):
                 self.assertAlmostEqual(float(track[1]), end, places=5)
 
     def test_what_exists_stays(self):
-        for arguments, name in (LABELS, PICTURE):
+        for arguments, name, mark in ((*LABELS, b"highlight"), (*PICTURE, b"highlight"),
+                                      (*CLICK, b"RIFF")):
             with self.subTest(name=name):
                 target = self.put(name, b"mine\n")
                 done = self.run_tavo(*arguments, "song.wav", status=1)
                 self.assertIn(b"--force", done.stderr)
                 self.assertEqual((done.stdout, target.read_bytes()), (b"", b"mine\n"))
                 self.run_tavo(*arguments, "--force", "song.wav")
-                self.assertIn(b"highlight", target.read_bytes())
-        self.assert_only("song.wav", LABELS[1], PICTURE[1])
+                self.assertIn(mark, target.read_bytes())
+        self.assert_only("song.wav", LABELS[1], PICTURE[1], CLICK[1])
 
     def test_places_that_cannot_be_written(self):
         before = self.song.read_bytes()
@@ -101,7 +102,8 @@ class Outputs(Case):
         self.assertEqual(os.listdir(out), [LABELS[1]])
         self.assertEqual(os.listdir(self.folder / "x"), ["song.wav"])
         os.chmod(out, 0o555)
-        done = self.run_tavo(*LABELS[0], "--force", "-o", "out", "x", status=1, **nobody())
+        done = self.run_tavo(*LABELS[0], "--force", "-o", "out", "x", status=1,
+                             before=AS_ORDINARY_USER)
         self.assertIn(b"cannot be written: permission denied", done.stderr)
 
     def test_a_stop_while_drawing(self):
