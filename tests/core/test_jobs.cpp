@@ -6,7 +6,7 @@
 #include <cstdlib>
 
 #include "core/jobs.h"
-#include "job_harness.h"
+#include "tests/support/job_harness.h"
 #include "tests/support/song.h"
 
 namespace {

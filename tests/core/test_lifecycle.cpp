@@ -6,9 +6,9 @@
 #include <thread>
 
 #include "core/lifecycle.h"
-#include "job_harness.h"
 #include "media_source/mtsrc_ctx.h"
 #include "pcm/decode.h"
+#include "tests/support/job_harness.h"
 #include "tests/support/song.h"
 
 namespace {

@@ -7,7 +7,7 @@
 #include <filesystem>
 #include <fstream>
 
-#include "tests/core/job_harness.h"
+#include "tests/support/job_harness.h"
 
 namespace {
 

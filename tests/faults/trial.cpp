@@ -1,4 +1,4 @@
-#include "tests/trials/trial.h"
+#include "tests/faults/trial.h"
 
 #include <algorithm>
 #include <cstdio>

@@ -1,13 +1,13 @@
 // One job under a plan of failures, from its creation to its release, and the verdict on it.
-#ifndef TAVO_TESTS_TRIALS_FAULT_RUN_H
-#define TAVO_TESTS_TRIALS_FAULT_RUN_H
+#ifndef TAVO_TESTS_FAULTS_FAULT_RUN_H
+#define TAVO_TESTS_FAULTS_FAULT_RUN_H
 
 #include <string>
 #include <utility>
 #include <vector>
 
-#include "tests/core/job_harness.h"
-#include "tests/trials/fault_plan.h"
+#include "tests/faults/fault_plan.h"
+#include "tests/support/job_harness.h"
 
 namespace fault {
 

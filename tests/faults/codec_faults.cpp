@@ -6,11 +6,11 @@
 #include <map>
 #include <set>
 
-#include "tests/core/job_harness.h"
+#include "tests/faults/measure.h"
+#include "tests/faults/trial.h"
 #include "tests/media_source/source_case.h"
+#include "tests/support/job_harness.h"
 #include "tests/support/song.h"
-#include "tests/trials/measure.h"
-#include "tests/trials/trial.h"
 
 // Claims of more memory than there is are refused, not fatal.
 extern "C" const char *__asan_default_options() {

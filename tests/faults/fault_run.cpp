@@ -1,4 +1,4 @@
-#include "tests/trials/fault_run.h"
+#include "tests/faults/fault_run.h"
 
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -7,7 +7,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "tests/trials/trial.h"
+#include "tests/faults/trial.h"
 
 extern "C" void __sanitizer_set_death_callback(void (*callback)()) __attribute__((weak));
 

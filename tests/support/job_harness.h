@@ -1,6 +1,6 @@
 // Runs jobs in tests: a callback that counts and copies what it gets, and can be held up.
-#ifndef TAVO_TESTS_CORE_JOB_HARNESS_H
-#define TAVO_TESTS_CORE_JOB_HARNESS_H
+#ifndef TAVO_TESTS_SUPPORT_JOB_HARNESS_H
+#define TAVO_TESTS_SUPPORT_JOB_HARNESS_H
 
 #include <condition_variable>
 #include <mutex>

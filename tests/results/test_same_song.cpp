@@ -12,7 +12,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/core/job_harness.h"
+#include "tests/support/job_harness.h"
 
 namespace {
 

@@ -1,7 +1,7 @@
 // Time and memory of a trial: a watch that ends the program when a run takes too long, and the
 // most memory that the process has held.
-#ifndef TAVO_TESTS_TRIALS_MEASURE_H
-#define TAVO_TESTS_TRIALS_MEASURE_H
+#ifndef TAVO_TESTS_FAULTS_MEASURE_H
+#define TAVO_TESTS_FAULTS_MEASURE_H
 
 #include <unistd.h>
 

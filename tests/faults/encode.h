@@ -1,6 +1,6 @@
 // Short files in every format, by the encoders that make the codec tests' fixtures.
-#ifndef TAVO_TESTS_TRIALS_ENCODE_H
-#define TAVO_TESTS_TRIALS_ENCODE_H
+#ifndef TAVO_TESTS_FAULTS_ENCODE_H
+#define TAVO_TESTS_FAULTS_ENCODE_H
 
 #include <gtest/gtest.h>
 

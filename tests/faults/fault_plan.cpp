@@ -1,4 +1,4 @@
-#include "tests/trials/fault_plan.h"
+#include "tests/faults/fault_plan.h"
 
 #include <fcntl.h>
 #include <pthread.h>

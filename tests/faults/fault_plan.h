@@ -1,8 +1,8 @@
 // Makes calls of the library and its codec library fail by plan, and counts what they obtain. The
 // program is linked with --wrap for all of them: only the calls of our own objects are caught, on
 // every thread.
-#ifndef TAVO_TESTS_TRIALS_FAULT_PLAN_H
-#define TAVO_TESTS_TRIALS_FAULT_PLAN_H
+#ifndef TAVO_TESTS_FAULTS_FAULT_PLAN_H
+#define TAVO_TESTS_FAULTS_FAULT_PLAN_H
 
 #include <cstdint>
 

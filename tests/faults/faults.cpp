@@ -10,8 +10,8 @@
 #include <string>
 #include <vector>
 
-#include "tests/trials/fault_run.h"
-#include "tests/trials/trial.h"
+#include "tests/faults/fault_run.h"
+#include "tests/faults/trial.h"
 
 namespace {
 

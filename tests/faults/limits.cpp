@@ -6,11 +6,11 @@
 #include <cmath>
 #include <filesystem>
 
-#include "tests/core/job_harness.h"
 #include "tests/desktop/codec_test.h"
-#include "tests/trials/encode.h"
-#include "tests/trials/measure.h"
-#include "tests/trials/trial.h"
+#include "tests/faults/encode.h"
+#include "tests/faults/measure.h"
+#include "tests/faults/trial.h"
+#include "tests/support/job_harness.h"
 
 namespace {
 

@@ -1,28 +1,35 @@
 #!/bin/sh
-# make_fixtures.sh MAKE_SONG DIR: encodes the synthetic song in every format into DIR, with Debian's
-# encoders. Nothing is done when DIR is complete and newer than this script and MAKE_SONG.
+# make_songs.sh MAKE_SONG DIR: makes every song that the tests read, by make_song and Debian's encoders.
+# DIR/codec: every kind of stream and container. DIR/formats: one song in each format. DIR/short: songs
+# whose analysis takes milliseconds. DIR/jni, DIR/results: WAV files. Nothing is done when DIR is
+# complete and newer than this script and MAKE_SONG.
 set -eu
 make_song=$1
 out=$2
 for tool in ffmpeg lame flac metaflac oggenc; do
-  command -v "$tool" >/dev/null || { echo "make_fixtures.sh: $tool is missing" >&2; exit 1; }
+  command -v "$tool" >/dev/null || { echo "make_songs.sh: $tool is missing" >&2; exit 1; }
 done
 if [ -e "$out/.complete" ] && [ "$out/.complete" -nt "$0" ] && [ "$out/.complete" -nt "$make_song" ]; then
   exit 0
 fi
 rm -rf "$out"
 mkdir -p "$out"
-cd "$out"
+out=$(cd "$out" && pwd)
 
+folder() { # folder NAME: what follows is made there
+  mkdir "$out/$1"
+  cd "$out/$1"
+}
 song() { # song FILE OPTIONS...
   "$make_song" "$@" >/dev/null
 }
-convert() { # convert IN OUT OPTIONS...: by ffmpeg, without marks of its own
+convert() { # convert IN OUT OPTIONS...: by ffmpeg, without a version in the file
   in=$1 to=$2
   shift 2
   ffmpeg -nostdin -v error -y -i "$in" -map_metadata -1 -fflags +bitexact -flags:a +bitexact "$@" "$to"
 }
 
+folder codec
 song song.wav --seconds 12 --loud-at 4
 song mono.wav --seconds 12 --loud-at 4 --channels 1
 song song48.wav --seconds 12 --loud-at 4 --rate 48000
@@ -88,4 +95,58 @@ ffmpeg -nostdin -v error -y -f lavfi -i testsrc=size=64x64:rate=10:duration=12 -
   -map 0:v -map 1:a -c:v libtheora -c:a copy video.ogv
 convert song48.wav opus.ogg -c:a libopus
 
-touch .complete
+# One song in each format: the encoders' delays are known.
+folder formats
+song song.wav --accents --seconds 80 --loud-at 31 --seed 2
+flac --totally-silent -5 -o song.flac song.wav
+lame --quiet -b 160 -t song.wav constant.mp3
+lame --quiet -V 2 song.wav variable.mp3
+lame --quiet -V 2 -t song.wav variable_bare.mp3 # without the encoder's table
+convert song.wav song.aac -c:a aac -b:a 160k
+convert song.aac song.m4a -c:a copy -bsf:a aac_adtstoasc
+oggenc --quiet -q 6 -s 1 -o song.ogg song.wav
+for samples in 576 1024; do # the song as late as the encoders make it
+  convert song.wav late.wav -af "adelay=${samples}S:all=1"
+  flac --totally-silent -5 -o "late_$samples.flac" late.wav
+  rm late.wav
+done
+
+# The brief ones are decoded in one part, the short ones in four; the long ones have a highlight that
+# is not at their start; the many have more frames than an index first has room for. 11025 Hz goes
+# through the block average, 8000 Hz through the interpolator.
+folder short
+while read -r name seconds loud_at; do
+  song "$name.wav" --seconds "$seconds" --loud-at "$loud_at" --channels 1 --rate 11025
+  song low.wav --seconds "$seconds" --loud-at "$loud_at" --channels 1 --rate 8000
+  lame --quiet -b 24 -m m --add-id3v2 --tt 'A Title' --ta 'An Artist' --tc 'A comment' "$name.wav" "$name.mp3"
+  flac --totally-silent -5 -b 1024 -T 'TITLE=A Title' -T 'KEY=Am' -o "$name.flac" low.wav
+  convert low.wav "$name.aac" -c:a aac -b:a 24k
+  oggenc --quiet -q 1 -s 1 -t 'A Title' -a 'An Artist' -o "$name.ogg" low.wav
+  fragments=
+  [ "$name" != short ] || fragments='-movflags +delay_moov+default_base_moof -frag_duration 700000'
+  # shellcheck disable=SC2086 # words
+  convert "$name.aac" "$name.m4a" -c copy -bsf:a aac_adtstoasc -metadata title='A Title' $fragments
+  rm low.wav
+done <<END
+brief 4.5 2
+short 6 3
+long 15 8
+many 150 40
+END
+
+folder jni
+song song.wav --seconds 20 --bpm 120 --loud-at 6
+song clip.wav --seconds 2
+
+# Each way of converting the rate, one and four segments, slow to fast.
+folder results
+song stereo_120.wav --seconds 70 --bpm 120 --loud-at 24
+song mono_48k_87.wav --seconds 40 --bpm 87 --rate 48000 --channels 1
+song fast_173.wav --seconds 30 --bpm 173 --seed 2
+song slow_62.wav --seconds 45 --bpm 62 --rate 32000 --seed 3
+song block_2_140.wav --seconds 25 --bpm 140 --rate 22050
+song own_rate_100.wav --seconds 25 --bpm 100 --rate 11025 --channels 1
+song low_rate_95.wav --seconds 20 --bpm 95 --rate 8000 --channels 1
+song one_segment_130.wav --seconds 4.5 --bpm 130
+
+touch "$out/.complete"

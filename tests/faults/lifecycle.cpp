@@ -10,10 +10,10 @@
 #include <random>
 #include <thread>
 
-#include "tests/core/job_harness.h"
+#include "tests/faults/measure.h"
+#include "tests/faults/trial.h"
+#include "tests/support/job_harness.h"
 #include "tests/support/song.h"
-#include "tests/trials/measure.h"
-#include "tests/trials/trial.h"
 
 extern "C" __attribute__((weak)) size_t __sanitizer_get_current_allocated_bytes();
 

@@ -5,8 +5,8 @@
 // as lines "figure SET name=value ...", one line a row; all rows of a set have the same names.
 // Values have no spaces. scripts/reliability.py makes docs/RELIABILITY.md of the lines of the full
 // tier.
-#ifndef TAVO_TESTS_TRIALS_TRIAL_H
-#define TAVO_TESTS_TRIALS_TRIAL_H
+#ifndef TAVO_TESTS_FAULTS_TRIAL_H
+#define TAVO_TESTS_FAULTS_TRIAL_H
 
 #include <cstdint>
 #include <string>
