@@ -49,19 +49,21 @@ void make_blip(int32_t sr, int32_t length, float *blip) {
     }
 }
 
-// The sample nearest to a beat, n for one behind the n samples.
+// The sample nearest to a beat, n for one behind the n samples, -1 for one before them.
 int64_t beat_sample(float beat, int32_t sr, int64_t n) {
     const float samples = beat * static_cast<float>(sr) / 1000.0f;
     const double nearest = static_cast<double>(samples) + 0.5;
+    if (!(nearest > -1.0)) return -1;
     return nearest < static_cast<double>(n) ? static_cast<int64_t>(nearest) : n;
 }
 
-// A blip that the end cuts short ends one sample before it, and its length stays for those to come.
+// A blip truncated at the end of the track stops one sample early; later blips keep the shortened
+// length.
 void lay_blips(const float *blip, int64_t length, const float *beats, int32_t count, int32_t sr,
                int64_t n, float *track) {
     for (int32_t b = 0; b < count; ++b) {
-        if (!(beats[b] >= 0.0f)) continue;
         const int64_t start = beat_sample(beats[b], sr, n);
+        if (start < 0) continue;
         if (n - start < length) length = n - start > 0 ? n - start - 1 : 0;
         for (int64_t i = 0; i < length; ++i) track[start + i] = blip[i];
     }

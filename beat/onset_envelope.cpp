@@ -45,14 +45,14 @@ void release_run(onset_run *run) {
     tavo_fft_deinit(&run->fft);
 }
 
-bool obtain_run(onset_run *run, int64_t frames, int32_t frame_size, int32_t bands) {
+bool obtain_run(onset_run *run, int64_t frames, int32_t frame_size) {
     tavo_fft_init(static_cast<int16_t>(frame_size), &run->fft);
     run->workers = zeroed_items<TAVO_ONSET_WORKER>(kBeatWorkers);
     run->done = zeroed_items<int32_t>(kBeatWorkers);
     run->spectrum = zeroed_items<float *>(frames);
     run->spectrum_rows = zeroed_items<float>(kBeatWorkers * kBatch * (frame_size / 2));
     run->mel = zeroed_items<double *>(frames);
-    run->mel_rows = zeroed_items<double>(frames * bands);
+    run->mel_rows = zeroed_items<double>(frames * kMelBands);
     run->window = hann_window(frame_size);
     return run->fft.cos_table != nullptr && run->workers != nullptr && run->done != nullptr &&
            run->spectrum != nullptr && run->spectrum_rows != nullptr && run->mel != nullptr &&
@@ -107,8 +107,8 @@ void run_onset_worker(void *record) {
     free(im);
 }
 
-void fill_workers(const TAVO_BEAT_CTX *beat, int32_t hop_size, const onset_run *run) {
-    const int32_t frame_size = beat->half_frame * 2;
+void fill_workers(const TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size,
+                  const onset_run *run) {
     const int64_t share = beat->frame_count / kBeatWorkers;
     for (int32_t id = 0; id < kBeatWorkers; ++id) {
         TAVO_ONSET_WORKER *worker = &run->workers[id];
@@ -126,14 +126,14 @@ void fill_workers(const TAVO_BEAT_CTX *beat, int32_t hop_size, const onset_run *
         worker->thread_count = kBeatWorkers;
         worker->mutex = feat_mutex_mt;
         worker->cond = feat_cond_mt;
-        worker->band_count = beat->band_count;
+        worker->band_count = kMelBands;
         worker->mel_matrix = beat->mel_matrix;
         worker->mel = run->mel;
         worker->window = run->window;
         for (int64_t k = worker->first; k <= worker->last; ++k) {
             const int64_t row = id * kBatch + (k - worker->first) % kBatch;
-            run->spectrum[k] = run->spectrum_rows + row * beat->half_frame;
-            run->mel[k] = run->mel_rows + k * beat->band_count;
+            run->spectrum[k] = run->spectrum_rows + row * (frame_size / 2);
+            run->mel[k] = run->mel_rows + k * kMelBands;
         }
     }
 }
@@ -153,19 +153,19 @@ bool run_workers(const onset_run *run) {
 }
 
 // Mean change of level from one frame's bands to the next one's, falls and rises alike.
-double band_change(const double *now, const double *next, int32_t bands) {
+double band_change(const double *now, const double *next) {
     double sum = 0.0;
-    for (int32_t b = 0; b < bands; ++b) {
+    for (int32_t b = 0; b < kMelBands; ++b) {
         const double difference = next[b] - now[b];
         if (!std::isnan(difference)) sum += fabs(difference);
     }
-    return sum / bands;
+    return sum / kMelBands;
 }
 
 void fill_envelope(TAVO_BEAT_CTX *beat, double *const *mel) {
     const int64_t count = beat->frame_count - 1;
     for (int64_t k = 0; k < count; ++k) {
-        beat->onset_env[k] = band_change(mel[k], mel[k + 1], beat->band_count);
+        beat->onset_env[k] = band_change(mel[k], mel[k + 1]);
     }
 
     double mean = 0.0;
@@ -187,15 +187,14 @@ void *_tavo_proc_onsetenv(void *record) {
 }
 
 void _getOnsetEnvelope(TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size) {
-    const bool usable = frame_size >= 2 && frame_size <= kMaxFrameSize && hop_size >= 1 &&
-                        frame_size == beat->half_frame * 2;
+    const bool usable = frame_size >= 2 && frame_size <= kMaxFrameSize && hop_size >= 1;
     if (!usable || beat->frame_count < 2 || feat_mutex_mt == nullptr || feat_cond_mt == nullptr) {
         return;
     }
 
     onset_run run = {};
-    if (obtain_run(&run, beat->frame_count, frame_size, beat->band_count)) {
-        fill_workers(beat, hop_size, &run);
+    if (obtain_run(&run, beat->frame_count, frame_size)) {
+        fill_workers(beat, frame_size, hop_size, &run);
         if (run_workers(&run)) fill_envelope(beat, run.mel);
     }
     release_run(&run);

@@ -9,7 +9,9 @@
 
 extern "C" {
 
-// Fills onset_env[0 .. F - 2] on four threads; leaves it zero when memory runs out.
+// Fills onset_env[0 .. F - 2] on four threads; leaves it as it was when memory runs out. Reads
+// signal, frame_count and mel_matrix (frame_size / 2 rows of 36) of the context, and frame_size, a
+// power of two from 2 to 16384, and hop_size from the arguments, all in samples.
 void _getOnsetEnvelope(TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size);
 
 // Thread entry of one worker, and its completion handler. The argument is the TAVO_ONSET_WORKER.

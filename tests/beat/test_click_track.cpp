@@ -76,6 +76,13 @@ TEST(ClickTrack, BlipIsPlacedAtTheNearestSample) {
     EXPECT_EQ(blip[kBlip], 0.0f);
 }
 
+// A tenth of a millisecond before the start is 1.1 samples; with the half that rounds, 0.6 of one,
+// which truncation takes to 0. Two tenths lie a whole sample before it.
+TEST(ClickTrack, ABeatJustBeforeTheStart) {
+    EXPECT_NE(track_of({-0.1f}, 20000)[1], 0.0f);
+    EXPECT_EQ(track_of({-0.2f}, 20000), std::vector<float>(20000));
+}
+
 // 50 ms are 551.25 samples: the second blip begins at 1654 and ends the first.
 TEST(ClickTrack, LaterBlipReplacesTheTail) {
     const std::vector<float> one = track_of({100.0f}, 5000);

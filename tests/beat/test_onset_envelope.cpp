@@ -24,7 +24,11 @@ TEST(OnsetEnvelope, Impulse) {
     std::vector<double> samples(11025);
     samples[2660] = 32767.0;
     working_context work(samples);
+    // The sizes are the arguments, and there are 36 bands: the context's own fields are not read.
+    work.beat.half_frame = 0;
+    work.beat.band_count = 0;
     _getOnsetEnvelope(&work.beat, 512, 256);
+    work.beat.half_frame = 256;  // rows to release
 
     double change[3] = {};
     for (int band = 0; band < 36; ++band) {
