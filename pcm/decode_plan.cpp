@@ -20,6 +20,11 @@ int32_t segments_for(int64_t units) {
     return units > kSingleThreadUnits ? kParallelSegments : 1;
 }
 
+// Records in the table. A later plan may use fewer of them than setup made.
+int32_t table_size(const TAVO_CTX *ctx) {
+    return std::max(ctx->seg_count, segments_for(ctx->duration));
+}
+
 // Learns format and duration from a source that is closed again.
 int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     int32_t err = 0;
@@ -51,7 +56,8 @@ int32_t place_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_l
     if (!span_bytes(last ? seg_len : seg_len + kOverlapUnits, ctx->fmt.sample_rate, &seg->cap)) {
         return TAVO_ERR_MEMORY;
     }
-    seg->buf = static_cast<uint8_t *>(malloc(static_cast<size_t>(seg->cap)));
+    // At least one byte: an empty request may be answered by null.
+    seg->buf = static_cast<uint8_t *>(malloc(static_cast<size_t>(std::max<int64_t>(seg->cap, 1))));
     if (seg->buf == nullptr) return TAVO_ERR_MEMORY;
 
     seg->seek_pos = start;  // stands when the seek fails without reporting a position
@@ -115,6 +121,9 @@ int32_t build_decoding(TAVO_CTX *ctx, const mtsrc_param *open_param) {
 
 int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param) {
     const mtsrc_param open_param = {param->path};
+    ctx->seg = nullptr;
+    ctx->pcm = nullptr;
+    ctx->seg_count = 0;
     const int32_t err = build_decoding(ctx, &open_param);
     if (err != 0) tavo_decode_deinit(ctx);
     return err;
@@ -123,9 +132,8 @@ int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param) {
 void tavo_decode_deinit(TAVO_CTX *ctx) {
     if (ctx->seg != nullptr) {
         free(ctx->seg[0].done);
-        // A later plan may use fewer records than setup made, and all of them hold a source.
-        const int32_t made = segments_for(ctx->duration);
-        for (int32_t i = 0; i < made; ++i) {
+        const int32_t records = table_size(ctx);
+        for (int32_t i = 0; i < records; ++i) {
             if (ctx->seg[i].src != nullptr) mtsrc_deinit(ctx->seg[i].src);
             free(ctx->seg[i].buf);
         }
@@ -138,24 +146,24 @@ void tavo_decode_deinit(TAVO_CTX *ctx) {
 }
 
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start) {
-    int64_t rest = 0;
     ctx->pcm = nullptr;
     ctx->pcm_bytes = 0;
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
     // The caller has freed the buffers: nothing that fails below may leave them to a release.
-    const int32_t made = segments_for(ctx->duration);
-    for (int32_t i = 0; i < made; ++i) ctx->seg[i].buf = nullptr;
-    if (__builtin_sub_overflow(ctx->duration, start, &rest) || rest <= 0) return TAVO_ERR_MEMORY;
+    const int32_t records = table_size(ctx);
+    for (int32_t i = 0; i < records; ++i) ctx->seg[i].buf = nullptr;
 
-    // A start before the stream's own must not ask for more records than setup made.
-    ctx->seg_count = std::min(segments_for(rest), made);
+    int64_t rest = 0;
+    if (__builtin_sub_overflow(ctx->duration, start, &rest) || rest < 0) return TAVO_ERR_MEMORY;
+    // A start before the stream's own must not ask for more records than there are.
+    ctx->seg_count = std::min(segments_for(rest), records);
     const int64_t seg_len = rest / ctx->seg_count;
     int32_t err = 0;
     for (int32_t i = 0; i < ctx->seg_count && err == 0; ++i) {
         err = place_segment(ctx, i, start + i * seg_len, seg_len);
     }
     if (err == 0) err = make_pcm(ctx, rest);
-    for (int32_t i = 0; i < made && err != 0; ++i) {
+    for (int32_t i = 0; i < records && err != 0; ++i) {
         free(ctx->seg[i].buf);
         ctx->seg[i].buf = nullptr;
     }

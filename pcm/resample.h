@@ -63,7 +63,8 @@ void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, do
 void *_resampleMT(void *part);
 void resampleMT_thd_cleanup(void *part);
 
-// Fills a cleared state. Returns 0; -1 when one of the rates is not positive.
+// Fills a cleared state. Returns 0; -1 when the target rate is not positive or the source rate is
+// 0. A source rate below 0 gives a table of no use: the conversion refuses it.
 int32_t dorn_resampler_prepare(dorn_resampler_state *state, int32_t source_rate,
                                int32_t target_rate, int32_t channels);
 

@@ -147,7 +147,7 @@ int32_t dorn_resampler_prepare(dorn_resampler_state *state, int32_t source_rate,
     if (state == nullptr || target_rate < 1) return -1;
     const float ratio = static_cast<float>(source_rate) / static_cast<float>(target_rate);
     state->ratio = ratio;
-    if (!(ratio > 0.0F)) return -1;  // a source rate below 0 would never reach the input's end
+    if (ratio == 0.0f) return -1;
 
     const auto r = static_cast<double>(ratio);
     const bool whole = std::fabs(r - std::floor(r + 0.5)) < kWholeRatio;

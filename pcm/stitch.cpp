@@ -1,23 +1,25 @@
 #include "pcm/stitch.h"
 
 #include <algorithm>
+#include <cstring>
+
+#include "pcm/block_search.h"
 
 namespace {
 
-// The last place in dst[1, total - 200] that holds the first bytes of data, or total without one.
-int64_t find_seam(const uint8_t *dst, int64_t total, const uint8_t *data) {
-    const match_block block = {data, load_head(data)};
-    for (int64_t place = total - kMatchBytes; place >= 1; --place) {
-        if (block_is_at(block, dst + place)) return place;
-    }
-    return total;
+// Where data goes in the output of total bytes: the last place that holds its first bytes, never
+// byte 0; else the end.
+int64_t find_seam(const uint8_t *dst, int64_t total, const uint8_t *data, int64_t avail) {
+    if (avail < kBlockBytes) return total;
+    const int64_t seam = find_highest(dst, {1, total - kBlockBytes + 1}, data);
+    return seam == kNoPlace ? total : seam;
 }
 
 }  // namespace
 
 int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
                         int64_t capacity) {
-    const int64_t skip = segment_skip(rate);
+    const int64_t skip = second_bytes(rate);
     if (dst == nullptr || capacity < 1 || skip < 1) return 0;
 
     int64_t total = 0;
@@ -28,9 +30,7 @@ int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uin
         if (avail < 1) return 0;
 
         const uint8_t *data = seg[k].buf + drop;
-        if (k > 0 && total > kMatchBytes && avail >= kMatchBytes) {
-            total = find_seam(dst, total, data);
-        }
+        if (k > 0) total = find_seam(dst, total, data, avail);
         const int64_t bytes = std::min(capacity - total, avail);
         if (bytes < 1) return 0;
         memcpy(dst + total, data, static_cast<size_t>(bytes));

@@ -18,6 +18,8 @@ struct fake_audio {
     int failing_seeks = 0;  // the next seeks that fail, without reporting a position
     int64_t report = -1;    // units reported by the next seek, whatever it is asked
     int64_t land = -1;      // stream byte where the next seek lands, whatever it is asked
+    int empty_replies = 0;  // reads that bring nothing before the others do
+    int32_t code = 0;       // of a read within the stream
 
     // Seen by the fake.
     std::vector<int64_t> seeks;   // positions asked for
@@ -40,6 +42,11 @@ inline int32_t fake_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
         frame->size = want;  // must not be counted
         return -6;
     }
+    if (audio->empty_replies > 0) {
+        --audio->empty_replies;
+        frame->size = 0;
+        return audio->code;
+    }
     const int64_t left = static_cast<int64_t>(audio->stream.size()) - self->at;
     const int64_t bytes = std::clamp<int64_t>(left, 0, want);
     auto *out = static_cast<uint8_t *>(frame->data);
@@ -47,7 +54,7 @@ inline int32_t fake_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
     for (int64_t i = 0; i < bytes && self->warm > 0; ++i, --self->warm) out[i] ^= 0x55;
     self->at += bytes;
     frame->size = static_cast<int32_t>(bytes);
-    return bytes < want ? 1 : 0;
+    return bytes < want ? 1 : audio->code;
 }
 
 inline int32_t fake_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {

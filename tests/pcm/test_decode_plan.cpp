@@ -180,10 +180,14 @@ TEST_F(second_plan, covers_the_rest) {
 }
 
 TEST_F(second_plan, is_refused) {
-    // One unit at 8000 Hz is no whole byte.
-    for (const int64_t start : {kDuration, kDuration + 1, kDuration - 1, INT64_MAX, INT64_MIN}) {
+    // One unit at 8000 Hz is no whole byte. With nothing left the steps are done all the same.
+    for (const int64_t start : {kDuration, kDuration - 1, kDuration + 1, INT64_MAX, INT64_MIN}) {
         SCOPED_TRACE(start);
         EXPECT_EQ(plan(start), -2);
+        const bool planned = start <= kDuration && start > 0;
+        EXPECT_EQ(audio[0].seeks.size(), planned ? 2U : 1U);
+        EXPECT_EQ(ctx.seg_count, planned ? 1 : 4);
+        EXPECT_EQ(ctx.seg[0].start, planned ? start : 0);
         for (int i = 0; i < 4; ++i) EXPECT_EQ(ctx.seg[i].buf, nullptr);
         EXPECT_EQ(ctx.pcm, nullptr);
     }

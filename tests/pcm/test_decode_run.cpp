@@ -69,6 +69,25 @@ TEST_F(ten_seconds, failed_source_keeps_what_it_gave) {
     EXPECT_EQ(ctx.seg[0].got, 57'344);
 }
 
+TEST_F(ten_seconds, reads_end_on_failure_codes_only) {
+    for (const int32_t code : {-7, -5, -3, -1, 2, 255, -2, -4, -6}) {
+        SCOPED_TRACE(code);
+        for (auto &each : audio) each.code = code;
+        lay();
+        const bool failure = code == -2 || code == -4 || code == -6;
+        EXPECT_EQ(decode(), failure ? 0 : 160'000);
+    }
+}
+
+TEST_F(ten_seconds, empty_replies_are_read_over_until_the_guard) {
+    for (const int replies : {65'535, 65'536}) {
+        for (auto &each : audio) each.empty_replies = replies;
+        lay();
+        EXPECT_EQ(decode(), replies < 65'536 ? 160'000 : 0);
+        for (auto &each : audio) each.empty_replies = 0;
+    }
+}
+
 TEST_F(ten_seconds, nothing_comes_of_a_segment_without_audio) {
     // The last segment brings nothing, or its skip and no more.
     for (const int64_t got : {0, 16'000}) {
@@ -102,6 +121,11 @@ TEST_F(ten_seconds, release_closes_every_source_once) {
     EXPECT_TRUE(ctx.seg == nullptr && ctx.pcm == nullptr);
     EXPECT_TRUE(ext_mutex_mt == nullptr && ext_cond_mt == nullptr);
     tavo_decode_deinit(&ctx);  // harmless
+
+    lay();
+    ctx.duration = 0;  // the plan's own count is the larger
+    tavo_decode_deinit(&ctx);
+    for (const auto &each : audio) EXPECT_EQ(each.closed, 2);
 }
 
 }  // namespace
