@@ -47,10 +47,14 @@ int32_t fill_step(mtsrc_ctx *src, uint8_t *frame_buf, void *work) {
     if (now->status.produced == 0) {
         return 0;
     }
-    if (!possible(now->output.bytes, src->q_room)) {
+    if (!possible(now->output.bytes, src->q_room + ops.spare)) {
         return -6;
     }
-    pcm_queue_push(src, ops.reduce(src, now->output.bytes, first));
+    const int32_t kept = ops.reduce(src, now->output.bytes, first);
+    if (kept > src->q_room) {
+        return -6;
+    }
+    pcm_queue_push(src, kept);
     return 0;
 }
 
@@ -77,8 +81,7 @@ int32_t codec_source_get_frm(const codec_source_ops &ops, mtsrc_ctx *src, int32_
                              mtsrc_frame *frame) {
     decoding now = {};
     now.ops = &ops;
-    const int32_t room = ops.largest > src->frm_buf_size ? ops.largest : src->frm_buf_size;
-    return pcm_queue_get(src, want, frame, {fill_step, &now, room});
+    return pcm_queue_get(src, want, frame, {fill_step, &now});
 }
 
 int32_t codec_source_seek(const codec_source_ops &ops, mtsrc_ctx *src, int64_t position,

@@ -33,8 +33,8 @@ struct codec_source_ops {
     int32_t (*move)(mtsrc_ctx *src, const int64_t *position, int64_t *reached);
     // Reduces the bytes decoded to q_wr in place and returns those that count.
     int32_t (*reduce)(const mtsrc_ctx *src, int32_t bytes, int64_t first);
-    // Bytes that a decoded frame may have though frm_buf_size is less; 0: no more than that.
-    int32_t largest;
+    // Bytes that a decoded frame may take beyond q_room before its reduction.
+    int32_t spare;
 };
 
 int32_t codec_source_get_frm(const codec_source_ops &ops, mtsrc_ctx *src, int32_t want,

@@ -23,7 +23,7 @@ mtsrc_ctx *new_handle(const mtsrc_io *io) {
     }
     src->q_cap = kQueueBytes;
     // Zeroed: bytes that count but hold no sample are delivered as well.
-    src->q_base = static_cast<uint8_t *>(calloc(1, kQueueBytes));
+    src->q_base = static_cast<uint8_t *>(calloc(1, kQueueBytes + kQueueSpareBytes));
     if (!src->q_base || pthread_mutex_init(&src->lock, nullptr) != 0) {
         free(src->q_base);
         free(src);
@@ -146,11 +146,7 @@ int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached) {
     if (!is_open(src)) {
         return -4;
     }
-    int64_t unread = 0;
-    int64_t *where = reached ? reached : &unread;
-    // A reader that moves without saying where counts as exact.
-    *where = position;
-    return src->seek(src, position, where);
+    return src->seek(src, position, reached);
 }
 
 int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {

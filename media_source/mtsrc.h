@@ -58,9 +58,9 @@ mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t flags, int32_t *err);
 /// Returns 0; -4 bad handle or null fmt.
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt);
 
-/// Moves to position (100-ns units); *reached gets the position where reading resumes, and is
-/// always written on success. Returns 0; -4 bad handle or failed seek, after which the queue is
-/// empty.
+/// Moves to position (100-ns units). reached is handed to the reader, which stores the position
+/// where reading resumes; set *reached before the call in case the reader leaves it alone. Returns
+/// 0; -4 bad handle or failed seek, after which the queue is empty.
 int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached);
 
 /// Delivers want bytes (at most 8192 by custom). Returns 0 exactly want bytes; 1 end of stream, the

@@ -7,6 +7,9 @@
 #include "media_source/mtsrc.h"
 
 constexpr int32_t kQueueBytes = 1'048'576;
+// Allocated behind the queue's q_cap bytes. The largest FLAC block decodes to 262,140 bytes, of
+// which half stay after the reduction to one channel; q_room exceeds 131,070 before each frame.
+constexpr int32_t kQueueSpareBytes = 131'070;
 
 // Codec codes of the codec library, handed to its decoders in every frame record.
 constexpr int32_t kCodecMpeg = 305;
@@ -30,7 +33,7 @@ struct mtsrc_ctx {
     void *demux;      // reader or demuxer, owned
     void *dstream;    // demuxer's stream (MP4, Ogg), owned
     void *decoder;    // owned; null for WAV
-    uint8_t *q_base;  // [q_cap] owned
+    uint8_t *q_base;  // [q_cap + kQueueSpareBytes] owned
     int32_t q_cap;    // bytes
     int32_t q_fill;   // bytes held
     int32_t q_room;   // bytes free behind q_wr

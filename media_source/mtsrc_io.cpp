@@ -60,15 +60,11 @@ int64_t mtsrc_file_read(mtsrc_file *file, void *buf, int32_t count) {
     if (!usable(file) || count < 0) {
         return -1;
     }
-    // A file system may deliver less than there is (a network's, when a signal arrives): only the
-    // file's end or a failure ends a read early, and a failure behind some bytes shows in the next.
-    int64_t done = 0;
     ssize_t got;
     do {
-        got = read(file->fd, static_cast<char *>(buf) + done, static_cast<size_t>(count - done));
-        done += got > 0 ? got : 0;
-    } while (done < count && (got > 0 || (got < 0 && errno == EINTR)));
-    return got < 0 && done == 0 ? -1 : done;
+        got = read(file->fd, buf, static_cast<size_t>(count));
+    } while (got < 0 && errno == EINTR);
+    return got;
 }
 
 int64_t mtsrc_file_write(mtsrc_file *file, const void *buf, int32_t count) {

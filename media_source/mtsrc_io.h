@@ -41,7 +41,9 @@ extern "C" {
 /// null on failure. mode bit 0: 0 read-only, 1 read-write, created with permissions 0644.
 mtsrc_file *mtsrc_file_open(const mtsrc_io *io, int32_t mode);
 
-/// A callback on a file of mtsrc_file_open, as the field of the same name in mtsrc_io.
+/// A callback on a file of mtsrc_file_open, as the field of the same name in mtsrc_io. Reading and
+/// writing are one system call, repeated only when a signal interrupts it: fewer bytes than count
+/// are no failure and no end.
 /// @{
 int32_t mtsrc_file_close(mtsrc_file *file);
 int64_t mtsrc_file_read(mtsrc_file *file, void *buf, int32_t count);

@@ -6,9 +6,9 @@
 namespace {
 
 constexpr int32_t kBytesPerSample = 2;
-// In a row: some 40 minutes of MPEG frames without a sample. A reader that hands out nothing for
-// longer hands it out for ever.
-constexpr int32_t kMaxEmptySteps = 100'000;
+// In a row: more than four days of MPEG frames without a sample. A reader that hands out nothing
+// for longer hands it out for ever.
+constexpr int32_t kMaxEmptySteps = 16'777'216;
 
 void make_room(mtsrc_ctx *src) {
     memmove(src->q_base, src->q_rd, static_cast<size_t>(src->q_fill));
@@ -28,9 +28,9 @@ void deliver(mtsrc_ctx *src, int32_t bytes, mtsrc_frame *frame) {
 int32_t fill_to(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill &fill) {
     int32_t empty_steps = 0;
     while (src->q_fill < want) {
-        if (src->q_room <= fill.room) {
+        if (src->q_room <= src->frm_buf_size) {
             make_room(src);
-            if (src->q_room <= fill.room) {
+            if (src->q_room <= src->frm_buf_size) {
                 return -4;
             }
         }
@@ -40,7 +40,7 @@ int32_t fill_to(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill
             return code;
         }
         empty_steps = src->q_fill > held ? 0 : empty_steps + 1;
-        if (empty_steps > kMaxEmptySteps) {
+        if (empty_steps >= kMaxEmptySteps) {
             return -6;
         }
     }

@@ -9,11 +9,10 @@
 
 // How a format adds its next frame to the queue.
 struct pcm_fill {
-    // frame_buf: [frm_buf_size]. Returns 0 to go on (also when nothing was added), 1 end of stream,
-    // or the negative code that ends the call.
+    // frame_buf: [frm_buf_size]; more than that many bytes are free at q_wr. Returns 0 to go on
+    // (also when nothing was added), 1 end of stream, or the negative code that ends the call.
     int32_t (*step)(mtsrc_ctx *src, uint8_t *frame_buf, void *work);
-    void *work;    // for step
-    int32_t room;  // bytes; more than this many are free at q_wr when step is called
+    void *work;  // for step
 };
 
 void pcm_queue_clear(mtsrc_ctx *src);

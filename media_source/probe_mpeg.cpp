@@ -104,7 +104,7 @@ bool skip_tag(scan *s, int32_t at) {
                s->io->seek(s->file, &start) != 0) {
         return false;
     }
-    const int64_t length = id3v2_length(header);
+    int64_t length = id3v2_length(header);
     return s->io->skip(s->file, &length) == 0 && refill(s);
 }
 
@@ -155,8 +155,8 @@ int32_t run_scan(scan *s) {
 
 bool has_transport_sync(const mtsrc_io *io, mtsrc_file *file) {
     uint8_t byte = 0;
-    return io->seek(file, &kTransportPacketBytes) == 0 && io->read(file, &byte, 1) == 1 &&
-           byte == kTransportSync;
+    int64_t offset = kTransportPacketBytes;
+    return io->seek(file, &offset) == 0 && io->read(file, &byte, 1) == 1 && byte == kTransportSync;
 }
 
 // A stream of another kind, by the head; the offset moves.

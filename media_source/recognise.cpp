@@ -27,7 +27,7 @@ bool peek_behind_tag(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file, 
     }
     bool found = true;
     if (memcmp(head, "ID3", 3) == 0) {
-        const int64_t length = id3v2_length(head);
+        int64_t length = id3v2_length(head);
         found = io->skip(file, &length) == 0;
     }
     found = found && io->read(file, bytes, count) == count;

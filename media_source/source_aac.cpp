@@ -24,7 +24,7 @@ constexpr codec_source_ops kAac = {
     read_frame,               // read
     seek_to,                  // move
     codec_source_keep_first,  // reduce
-    0,                        // largest
+    0,                        // spare
 };
 
 int32_t create(mtsrc_ctx *src, xaac_info *info) {

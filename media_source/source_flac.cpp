@@ -3,10 +3,8 @@
 namespace {
 
 constexpr int32_t kFrameBytes = 131'070;
-constexpr int32_t kMinRate = 8'000;                                  // Hz
-constexpr int32_t kMaxFlacRate = 192'000;                            // Hz
-constexpr int32_t kMaxBlock = 65'535;                                // sample pairs of a block
-constexpr int32_t kLargestFrame = kMaxBlock * kReducedChannels * 2;  // bytes of PCM
+constexpr int32_t kMinRate = 8'000;        // Hz
+constexpr int32_t kMaxFlacRate = 192'000;  // Hz
 
 int32_t read_frame(mtsrc_ctx *src, wexa_frame *frame, int64_t *first) {
     int64_t second = 0;
@@ -29,7 +27,7 @@ constexpr codec_source_ops kFlac = {
     read_frame,               // read
     seek_to,                  // move
     codec_source_keep_first,  // reduce
-    kLargestFrame,            // largest
+    kQueueSpareBytes,         // spare
 };
 
 int32_t create(mtsrc_ctx *src, xflac_info *info) {

@@ -42,7 +42,7 @@ constexpr codec_source_ops kMp123 = {
     read_frame,       // read
     seek_to,          // move
     reduce,           // reduce
-    0,                // largest
+    0,                // spare
 };
 
 int32_t create(mtsrc_ctx *src, xmp123_info *info) {

@@ -28,7 +28,7 @@ constexpr codec_source_ops kMp4Aac = {
     read_frame,               // read
     seek_to,                  // move
     codec_source_keep_first,  // reduce
-    0,                        // largest
+    0,                        // spare
 };
 constexpr codec_source_ops kMp4Mpeg = {
     xmp4fds_close,            // close_stream
@@ -40,7 +40,7 @@ constexpr codec_source_ops kMp4Mpeg = {
     read_frame,               // read
     seek_to,                  // move
     codec_source_keep_first,  // reduce
-    0,                        // largest
+    0,                        // spare
 };
 constexpr codec_source_ops kMp4None = {
     xmp4fds_close,            // close_stream
@@ -52,7 +52,7 @@ constexpr codec_source_ops kMp4None = {
     read_frame,               // read
     seek_to,                  // move
     codec_source_keep_first,  // reduce
-    0,                        // largest
+    0,                        // spare
 };
 
 const codec_source_ops &ops_of(const mtsrc_ctx *src) {
@@ -87,7 +87,7 @@ int32_t open_mpeg(mtsrc_ctx *src, const xmp4_track &track, int64_t duration) {
     src->frm_buf_size = kMpegFrameBytes;
     src->codec = kCodecMpeg;
     src->format = {track.sample_rate, track.channels, kBitsPerSample, duration};
-    return track.sample_rate > kMaxRate ? -3 : 0;
+    return track.sample_rate > kMaxRate || track.channels <= 0 ? -3 : 0;
 }
 
 int32_t create(mtsrc_ctx *src, xmp4_info *info) {
@@ -112,7 +112,7 @@ int32_t create(mtsrc_ctx *src, xmp4_info *info) {
     } else if (track.format_tag == kWexaTagMpegLayer3) {
         code = open_mpeg(src, track, info->duration);
     }
-    return code == 0 && track.channels <= 0 ? -3 : code;
+    return code;
 }
 
 }  // namespace

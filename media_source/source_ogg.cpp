@@ -28,7 +28,7 @@ constexpr codec_source_ops kOgg = {
     read_frame,             // read
     seek_to,                // move
     codec_source_keep_all,  // reduce
-    0,                      // largest
+    0,                      // spare
 };
 
 // On success the caller frees setup->data.
@@ -39,8 +39,7 @@ int32_t fetch_setup(mtsrc_ctx *src, wexa_frame *setup) {
         return -7;
     }
     const int32_t capacity = length;
-    // One byte more, so that no length of 0 reads as a failed allocation.
-    setup->data = malloc(static_cast<size_t>(capacity) + 1);
+    setup->data = malloc(static_cast<size_t>(capacity));
     if (!setup->data) {
         return -7;
     }

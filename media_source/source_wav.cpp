@@ -70,7 +70,7 @@ int32_t mtsource_wav_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
     if (!src) {
         return -4;
     }
-    return pcm_queue_get(src, want, frame, {fill_step, nullptr, src->frm_buf_size});
+    return pcm_queue_get(src, want, frame, {fill_step, nullptr});
 }
 
 int32_t mtsource_wav_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {
@@ -78,7 +78,7 @@ int32_t mtsource_wav_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {
         return -4;
     }
     pcm_queue_clear(src);
-    const int64_t seconds = position / kUnitsPerSecond;
+    int64_t seconds = position / kUnitsPerSecond;
     return xwavd_seek(src->demux, &seconds, reached, 0) == 0 ? 0 : -4;
 }
 

@@ -56,6 +56,35 @@ TEST(Files, HoldTheSameSamples) {
     EXPECT_EQ(read_all(fixture("stereo3.mp4")).size(), read_all(fixture("cbr.mp3")).size() + 529);
 }
 
+// The file delivers one byte at a time to the readers; recognition, which opens it first, asks for
+// whole heads.
+mtsrc_file *recognised;
+
+int64_t read_a_byte(mtsrc_file *file, void *buf, int32_t count) {
+    return mtsrc_file_read(file, buf, file == recognised ? count : std::min(count, 1));
+}
+
+TEST(Files, MayDeliverOneByteAtATime) {
+    for (const char *name :
+         {"song.wav", "cbr.mp3", "song.flac", "low.aac", "last.m4a", "song.ogg"}) {
+        SCOPED_TRACE(name);
+        mtsrc_io io = io_for(fixture(name));
+        io.path = strdup(fixture(name).c_str());  // the source's, once it is open
+        io.read = read_a_byte;
+        io.open = [](const mtsrc_io *of, int32_t mode) {
+            mtsrc_file *opened = mtsrc_file_open(of, mode);
+            if (recognised == nullptr) recognised = opened;
+            return opened;
+        };
+        recognised = nullptr;
+        int32_t err = 0;
+        mtsrc_ctx *source = mtsrc_open_mfal(&io, 0, &err);
+        ASSERT_NE(source, nullptr) << err;
+        expect_same(read(source, SIZE_MAX), read_all(fixture(name)));
+        mtsrc_deinit(source);
+    }
+}
+
 // The channels of a file of 16-bit samples behind a 44-byte header.
 std::vector<samples> wav_channels(const std::string &path) {
     const bytes file = load(path);

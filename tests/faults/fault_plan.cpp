@@ -31,7 +31,6 @@ constexpr size_t kCalls = static_cast<size_t>(call::count);
 fault::plan now;  // written while no other thread of the library runs
 std::atomic<int64_t> counts[kCalls];
 std::atomic<int64_t> refused, plans, blocks, locks, descriptors;
-std::atomic<int64_t> longest_read, reads;
 std::atomic<bool> holding;
 
 // The seek of the re-positioning, then the reads behind it.
@@ -62,14 +61,6 @@ void given_back(const void *object, std::atomic<int64_t> *kind = &blocks) {
     if (object != nullptr) --*kind;
 }
 
-size_t shortened(size_t count) {
-    const int64_t most = longest_read;
-    if (most == 0 || count == 0) return count;
-    if (most > 0) return std::min(count, static_cast<size_t>(most));
-    const auto mixed = static_cast<uint64_t>(++reads) * 0x9E3779B97F4A7C15U >> 33;
-    return 1 + mixed % std::min(count, static_cast<size_t>(-most));
-}
-
 }  // namespace
 
 namespace fault {
@@ -90,10 +81,6 @@ int64_t refusals() {
 }
 holdings held() {
     return {blocks, locks, descriptors};
-}
-void limit_reads(int64_t most) {
-    longest_read = most;
-    reads = 0;
 }
 void hide_landing(bool hide) {
     landing = hide ? kSeekIsNext : kShown;
@@ -310,7 +297,7 @@ int __wrap_dup(int fd) {
     return fails(call::dup) ? -1 : opened(__real_dup(fd), &descriptors);
 }
 ssize_t __wrap_read(int fd, void *buf, size_t count) {
-    return fails(call::read) ? -1 : __real_read(fd, buf, shortened(count));
+    return fails(call::read) ? -1 : __real_read(fd, buf, count);
 }
 off64_t __wrap_lseek64(int fd, off64_t offset, int whence) {
     return fails(call::seek) ? -1 : __real_lseek64(fd, offset, whence);

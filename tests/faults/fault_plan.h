@@ -44,9 +44,6 @@ struct holdings {
 };
 holdings held();
 
-// Most bytes that a read delivers: 0 all that is asked for, negative a random number up to it.
-void limit_reads(int64_t most);
-
 // The seek that follows next is one whose landing point is not found in the decoded PCM.
 void hide_landing(bool hide);
 int64_t second_plans();  // since arm

@@ -170,26 +170,8 @@ TEST(FaultsOfFiles, Duplicates) {
     close(input);
 }
 
-// What a file gives comes in pieces of any length, or a signal interrupts: nothing may change.
-TEST(FaultsOfFiles, ReadsInPieces) {
-    const struct {
-        const char *name;
-        int64_t most;
-    } pieces[] = {{"one_byte", 1}, {"random_lengths", -100}, {"long_random_lengths", -20'000}};
-    for (const auto &each : pieces) {
-        tally sum;
-        for (const std::string &format : formats()) {
-            for (const subject &of : subjects(format)) {
-                if (!trial::full() && (of.mode != TAVO_MODE_BEATS || !of.analysed)) continue;
-                const fault::outcome undisturbed = fault::run(of, {});
-                fault::limit_reads(each.most);
-                fault::judged(of, {}, undisturbed, true, &sum);
-                fault::limit_reads(0);
-            }
-        }
-        sum.places = sum.runs;
-        print("files", {{"call", "read"}, {"series", each.name}}, sum);
-    }
+// A signal interrupts a read: nothing may change.
+TEST(FaultsOfFiles, InterruptedReads) {
     fault::plan interrupted = {call::read};
     interrupted.error = EINTR;
     in_all_formats("files", "read_interrupted", interrupted, true, {false});

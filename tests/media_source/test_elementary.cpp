@@ -96,7 +96,8 @@ TEST_F(Elementary, ReaderFailuresAndImpossibleCountsEndTheCall) {
         faults[3].read_bytes = row.frame_bytes + 1;
         if (!row.decoder.empty()) {
             faults[4].bytes = -2;
-            faults[5].bytes = 1'048'576;  // more than is left behind the first frame
+            // More than is left behind the first frame.
+            faults[5].bytes = row.codec == 322 ? 1'048'575 + 131'070 : 1'048'575;
         }
         for (const scripted::frame &bad : faults) {
             SCOPED_TRACE(&bad - faults.data());
@@ -210,7 +211,46 @@ TEST_F(Elementary, FlacHasRoomForItsLargestBlock) {
     }
     for (const scripted::call &decoded : scripted::calls_of("xflacd_decode")) {
         const auto output = recorded<wexa_output>(decoded, 1);
-        EXPECT_LE(static_cast<uint8_t *>(output.data) + 262'140, src->q_base + src->q_cap);
+        EXPECT_LE(static_cast<uint8_t *>(output.data) + 262'140, src->q_base + 1'048'576 + 131'070);
+    }
+    // 127 requests leave 8,176 of the first eight blocks' 1,048,560 bytes, with a room of 16; the
+    // next moves them to the front before it fetches the ninth.
+    close_source();
+    open_frames(source_row_of("flac"), std::vector<scripted::frame>(10, block));
+    const struct {
+        int requests;
+        ptrdiff_t rd, wr;
+        int32_t room;
+    } places[] = {{1, 8'192, 131'070, 917'506},
+                  {126, 1'040'384, 1'048'560, 16},
+                  {1, 8'192, 139'246, 909'330}};
+    for (const auto &place : places) {
+        for (int i = 0; i < place.requests; ++i) EXPECT_EQ(read(8192), 0);
+        EXPECT_EQ(src->q_rd - src->q_base, place.rd);
+        EXPECT_EQ(src->q_wr - src->q_base, place.wr);
+        EXPECT_EQ(src->q_fill, place.wr - place.rd);
+        EXPECT_EQ(src->q_room, place.room);
+    }
+    // With 917,506 bytes held no room is left for one more block.
+    std::vector<scripted::frame> frames(7, block);
+    frames.push_back(group(2));
+    frames.back().pcm.assign(16, 2);
+    frames.push_back(block);
+    for (const int32_t want : {917'506, 917'507}) {
+        close_source();
+        open_frames(source_row_of("flac"), frames);
+        EXPECT_EQ(read(want), want == 917'506 ? 0 : -4);
+    }
+}
+
+TEST_F(Elementary, FramesThatAddNothingAreSkipped) {
+    for (const int64_t blanks : {16'777'215, 16'777'216}) {
+        scripted::script what;
+        what.blanks = blanks;
+        what.frames = {group(2)};
+        ASSERT_EQ(open_row(source_row_of("wav"), what), 0);
+        EXPECT_EQ(read(2), blanks == 16'777'215 ? 0 : -6);
+        close_source();
     }
 }
 
@@ -222,7 +262,7 @@ TEST_F(Elementary, SeeksAndResets) {
         reset_and_seek.push_back(row.seek());
         scripted::script what;
         what.frames = {group(2), group(4), group(6)};
-        what.seeks = {{0, 5'000'000'000}, {-1, {}}, {0, {}}};
+        what.seeks = {{0, 5'000'000'000}, {-1, {}}, {0, {}}, {0, {}}};
         ASSERT_EQ(open_row(row, what), 0);
         const auto queued = static_cast<int32_t>(expected_of(row, {4}).size());
         EXPECT_EQ(read(1), 0);
@@ -242,8 +282,13 @@ TEST_F(Elementary, SeeksAndResets) {
         EXPECT_EQ(mtsrc_seekstream(src, 1, &reached), -4);
         EXPECT_EQ(src->q_fill, 0);
         EXPECT_EQ(src->q_room, src->q_cap);
-        EXPECT_EQ(mtsrc_seekstream(src, 33, &reached), 0);  // moves without saying where
-        EXPECT_EQ(reached, 33);
+        // The caller's pointer reaches the reader, which may leave its value alone.
+        reached = 7;
+        EXPECT_EQ(mtsrc_seekstream(src, 33, &reached), 0);
+        EXPECT_EQ(reached, 7);
+        EXPECT_EQ(scripted::calls_of(row.seek()).back().addresses[1], &reached);
+        EXPECT_EQ(mtsrc_seekstream(src, 33, nullptr), 0);
+        EXPECT_EQ(scripted::calls_of(row.seek()).back().addresses[1], nullptr);
 
         EXPECT_EQ(read(1), 0);
         scripted::forget_calls();

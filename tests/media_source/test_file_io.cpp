@@ -54,6 +54,18 @@ TEST(FileIo, SeekSkipTellAndSize) {
     EXPECT_EQ(ten.at(), far + 1);
 }
 
+// The rest of what was asked for may never come.
+TEST(FileIo, AReadIsOneRead) {
+    int ends[2];
+    ASSERT_EQ(pipe(ends), 0);
+    ASSERT_EQ(write(ends[1], "123456", 6), 6);
+    mtsrc_file file = {ends[0]};
+    char buf[100];
+    EXPECT_EQ(mtsrc_file_read(&file, buf, 100), 6);
+    close(ends[0]);
+    close(ends[1]);
+}
+
 TEST(FileIo, AHandleWithoutADescriptorFails) {
     mtsrc_file none = {-1};
     int64_t value = 77;

@@ -67,6 +67,27 @@ TEST(Recognise, FilesByTheirHeads) {
     }
 }
 
+// The callbacks may come from another binary that knows no const.
+TEST(Recognise, CallbacksMayWriteThroughTheirArguments) {
+    mtsrc_io io = probe_io();
+    io.seek = [](mtsrc_file *file, const int64_t *offset) {
+        const int32_t result = mtsrc_file_seek(file, offset);
+        *const_cast<int64_t *>(offset) = *offset;
+        return result;
+    };
+    io.skip = [](mtsrc_file *file, const int64_t *distance) {
+        const int32_t result = mtsrc_file_skip(file, distance);
+        *const_cast<int64_t *>(distance) = -1;
+        return result;
+    };
+    for (const byte_run &content : {id3(20) + layer3_pair(), byte_run{0x47} + layer3_pair()}) {
+        memory_file file(content);
+        int32_t type = 0;
+        EXPECT_EQ(mtsrc_get_file_type(&io, &file.file, &type), 0);
+        EXPECT_EQ(type, 305);
+    }
+}
+
 TEST(Recognise, CallbacksThatFail) {
     mtsrc_io no_tell = probe_io();
     no_tell.tell = [](mtsrc_file *, int64_t *) { return -1; };

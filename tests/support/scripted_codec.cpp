@@ -163,12 +163,19 @@ int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_
         }
         of->state[kFlacReaderFlag] = 0;
     }
+    if (of->blanks < of->what->blanks) {
+        ++of->blanks;
+        w().calls.pop_back();
+        *bytes = 0;
+        return 0;
+    }
     const std::vector<frame> &frames = of->what->frames;
     const frame *now = of->place < frames.size() ? &frames[of->place] : nullptr;
     const int32_t result = take(now ? now->result : 1);
-    if (!now) {  // an end that is hidden is an empty frame
+    if (!now) {  // an end that is hidden is an empty frame, a thousand times
         *bytes = told("bytes", 0);
-        return result;
+        const bool hidden = result == 0 && ++of->hidden_ends <= 1000;
+        return result == 0 && !hidden ? -1 : result;
     }
     const size_t index = of->place++;
     if (result != 0) {
@@ -203,7 +210,9 @@ int32_t move(void *handle, int64_t position, int64_t *reached, int32_t flags) {
     const script &what = *of->what;
     if (of->seeks < what.seeks.size()) {
         const seek &answer = what.seeks[of->seeks++];
-        *reached = answer.reached.value_or(*reached);
+        if (reached && answer.reached) {
+            *reached = *answer.reached;
+        }
         return failure ? failure : answer.result;
     }
     if (failure) {

@@ -41,7 +41,8 @@ struct script {
     int64_t duration = 100'000'000;
     std::vector<int32_t> kinds = {kWexaKindAudio};  // MP4 tracks, Ogg streams
     std::optional<int32_t> kind_count = {};         // reported in place of kinds.size()
-    std::vector<frame> frames = {};            // after the last one: end of stream, again and again
+    std::vector<frame> frames = {};  // after the last one: end of stream, again and again
+    int64_t blanks = 0;  // empty frames that each reader hands out first, their calls not recorded
     std::vector<seek> seeks = {};              // the first answers, for each reader anew
     bool tags = false;                         // give a tag record with all 42 buffers allocated
     std::vector<uint8_t> setup = {1, 2, 3};    // Vorbis set-up data
@@ -51,11 +52,13 @@ struct script {
 // A call: the records as they were handed over, in the order of the arguments. Pointers to 32- and
 // 64-bit words that the library only writes are not recorded.
 //   *_create of readers: io, word, information record; of decoders: configuration
-//   get_frm: none; seek: position; get_info_aud: information record
+//   get_frm: none; seek: position, reached; get_info_aud: information record
 //   decode: frame, output, status, then the compressed bytes; xaacd_info: information, frame
 struct call {
     std::string name;
-    int32_t number = 0;  // get_frm: size; seek: flags; xmp4fds_open, xoggds_open: index
+    // get_frm: size; seek: flags; xmp4fds_open, xoggds_open: index; xoggds_get_format: bytes that
+    // the buffer has
+    int32_t number = 0;
     std::vector<std::vector<uint8_t>> records = {};
     std::vector<const void *> addresses = {};  // of the same records
 };

@@ -1,4 +1,6 @@
 // The codec library's functions, each noting its call and playing the script.
+#include <malloc.h>
+
 #include <algorithm>
 #include <cstring>
 
@@ -44,12 +46,12 @@ extern "C" {
     }
 #define SCRIPTED_SEEK(function)                                                 \
     int32_t function(void *reader, const int64_t *position, int64_t *reached) { \
-        const auto held = called(__func__, position);                           \
+        const auto held = called(__func__, position, reached);                  \
         return scripted::move(reader, *position, reached, 0);                   \
     }
 #define SCRIPTED_SEEK_WITH_FLAGS(function)                                                     \
     int32_t function(void *reader, const int64_t *position, int64_t *reached, int32_t flags) { \
-        const auto held = called(__func__, position);                                          \
+        const auto held = called(__func__, position, reached);                                 \
         return scripted::move(reader, *position, reached, flags);                              \
     }
 #define SCRIPTED_REMOVAL(function)          \
@@ -197,6 +199,7 @@ int32_t xoggds_get_info_aud(void *stream, xogg_stream *info) {
 }
 int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
     const auto held = called(__func__);
+    scripted::w().calls.back().number = static_cast<int32_t>(malloc_usable_size(buf));
     const int32_t result = scripted::take(0);
     const scripted::object *of = scripted::checked(stream);
     if (!of || result != 0) {

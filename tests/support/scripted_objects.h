@@ -19,8 +19,10 @@ struct object {
     std::string kind = {};  // what the names of its functions begin with
     size_t script_number = 0;
     const script *what = nullptr;
-    size_t place = 0;  // next frame
-    size_t seeks = 0;  // answers given
+    size_t place = 0;     // next frame
+    size_t seeks = 0;     // answers given
+    int64_t blanks = 0;   // given
+    int hidden_ends = 0;  // in a row
     object *parent = nullptr;
     int streams = 0;
 };
