@@ -84,10 +84,7 @@ extern "C" TAVO_CTX *tavo_init(const TAVO_PARAM *param, int32_t *err) {
     if (err == nullptr) err = &unread;
     *err = TAVO_ERR_HANDLE;
     if (param == nullptr) return nullptr;
-    if (!create_locks()) {
-        *err = TAVO_ERR_MEMORY;
-        return nullptr;
-    }
+    if (!create_locks()) return nullptr;
     TAVO_CTX *ctx = open_instance(param, err);
     if (ctx == nullptr) {
         destroy_locks();

@@ -10,41 +10,30 @@
 
 namespace {
 
-// The instance whose callback this thread may be inside of: tavo_deinit would join itself there.
-thread_local const TAVO_CTX *job_of_thread = nullptr;
-
 void decode(TAVO_CTX *ctx) {
     ctx->pcm_bytes = DecodePcmMT(ctx, ctx->pcm, ctx->pcm_bytes);
 }
 
 void deliver(TAVO_CTX *ctx) {
-    job_of_thread = ctx;
     if (ctx->callback != nullptr) ctx->callback(ctx->info);
-    job_of_thread = nullptr;
-}
-
-void report_highlight(TAVO_CTX *ctx) {
-    store_flag(&ctx->state, kStateFinished);
-    ctx->info->hl_pos = static_cast<int32_t>(ctx->hl->hl_pos);
-    ctx->info->status = 0;
-    deliver(ctx);
 }
 
 // Beat times count from the start of the analysed signal: make them count from the start of the
 // file.
 void shift_beats(TAVO_ONSET_CTX *onset, int32_t start_ms) {
-    if (start_ms == 0) return;
-    const float shift = static_cast<float>(start_ms);
+    const auto shift = static_cast<float>(start_ms);
     for (int32_t i = 0; i < onset->beat_count; ++i) onset->beat_times[i] += shift;
 }
 
-// No beats is a failure, whatever the reason; a highlight found before is reported all the same.
-void report_beats(TAVO_CTX *ctx, bool from_highlight, bool analysed) {
+// Runs the beat analysis if the analysis signal is there, and reports. No beats is a failure,
+// whatever the reason; a highlight found before is reported all the same.
+void find_and_report_beats(TAVO_CTX *ctx, bool from_highlight, bool converted) {
     TAVO_INFO *info = ctx->info;
-    TAVO_ONSET_CTX *onset = ctx->onset;
+    TAVO_ONSET_CTX *onset = converted ? ctx->onset : nullptr;
+    if (onset != nullptr) getBeatPosition(ctx);
     if (from_highlight) info->hl_pos = static_cast<int32_t>(ctx->hl->hl_pos);
-    if (analysed && onset->beat_count != 0) {
-        shift_beats(onset, info->hl_pos);
+    if (onset != nullptr && onset->beat_count != 0) {
+        if (from_highlight && info->hl_pos != 0) shift_beats(onset, info->hl_pos);
         info->beat_count = onset->beat_count;
         info->beat_times = onset->beat_times;
         info->status = 0;
@@ -57,22 +46,16 @@ void report_beats(TAVO_CTX *ctx, bool from_highlight, bool analysed) {
     deliver(ctx);
 }
 
-void beats_and_report(TAVO_CTX *ctx, bool from_highlight, bool converted) {
-    if (converted) getBeatPosition(ctx);
-    report_beats(ctx, from_highlight, converted);
-}
-
 }  // namespace
 
-bool runs_job_of(const TAVO_CTX *ctx) {
-    return job_of_thread == ctx;
-}
-
 extern "C" void *analyzeHighlightOnly(void *arg) {
-    TAVO_CTX *ctx = static_cast<TAVO_CTX *>(arg);
+    auto *ctx = static_cast<TAVO_CTX *>(arg);
     decode(ctx);
     getHLPosition(ctx);
-    report_highlight(ctx);
+    store_flag(&ctx->state, kStateFinished);
+    ctx->info->hl_pos = static_cast<int32_t>(ctx->hl->hl_pos);
+    ctx->info->status = 0;
+    deliver(ctx);
     pthread_exit(nullptr);
 }
 
@@ -81,26 +64,26 @@ extern "C" void *analyzeHighlight(void *arg) {
 }
 
 extern "C" void *analyzeOnsetOnly(void *arg) {
-    TAVO_CTX *ctx = static_cast<TAVO_CTX *>(arg);
+    auto *ctx = static_cast<TAVO_CTX *>(arg);
     decode(ctx);
     const int32_t code = dorn_resampler_run(ctx->pcm, ctx->pcm_bytes, ctx->fmt.sample_rate,
                                             ctx->ana_rate, &ctx->ana_len, &ctx->ana);
     free(ctx->pcm);
     ctx->pcm = nullptr;
-    beats_and_report(ctx, false, code == 0);
+    find_and_report_beats(ctx, false, code == 0);
     pthread_exit(nullptr);
 }
 
 extern "C" void *analyzeOnsetFromeHi(void *arg) {
-    TAVO_CTX *ctx = static_cast<TAVO_CTX *>(arg);
+    auto *ctx = static_cast<TAVO_CTX *>(arg);
     decode(ctx);
     const int64_t start_ms = getHLPosition(ctx);
     const int32_t code = tavo_get_from_here(ctx, start_ms);
-    beats_and_report(ctx, true, code == 0);
+    find_and_report_beats(ctx, true, code == 0);
     pthread_exit(nullptr);
 }
 
 extern "C" int32_t analyzeOnsetenv(TAVO_CTX *ctx) {
-    beats_and_report(ctx, ctx->mode == TAVO_MODE_BOTH, true);
+    find_and_report_beats(ctx, ctx->mode == TAVO_MODE_BOTH && ctx->hl != nullptr, true);
     return 0;
 }

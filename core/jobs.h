@@ -20,7 +20,4 @@ void *analyzeHighlight(void *ctx);      // the same as analyzeHighlightOnly, for
 int32_t analyzeOnsetenv(TAVO_CTX *ctx);
 }
 
-// True on the thread that is inside the callback of this instance's job.
-bool runs_job_of(const TAVO_CTX *ctx);
-
 #endif

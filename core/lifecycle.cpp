@@ -22,6 +22,11 @@ void poll_until_ended(const TAVO_CTX *ctx) {
     while (!job_ended(ctx)) sched_yield();
 }
 
+// True inside the callback of the job that tavo_analyze started: tavo_deinit would join itself.
+bool runs_job_of(const TAVO_CTX *ctx) {
+    return pthread_equal(ctx->worker, pthread_self()) != 0;
+}
+
 // A job may have been run without tavo_analyze, on a thread that is not ours to join.
 void join_worker(TAVO_CTX *ctx) {
     if (pthread_equal(ctx->worker, pthread_t{}) == 0) pthread_join(ctx->worker, nullptr);

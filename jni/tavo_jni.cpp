@@ -30,7 +30,7 @@ struct host_refs {
 pthread_mutex_t host_mutex = PTHREAD_MUTEX_INITIALIZER;
 host_refs *current_host = nullptr;  // under host_mutex
 
-// What tavo_jni_mutex points at once init has run. Static, so that creating it cannot fail.
+// What init lets tavo_jni_mutex point at when it is null. Static, so that creating it cannot fail.
 pthread_mutex_t lifecycle_mutex = PTHREAD_MUTEX_INITIALIZER;
 
 // Pointers that one thread publishes and others read without a lock: atomic access only.
@@ -40,9 +40,9 @@ TAVO_CTX *instance = nullptr;
 
 TAVO_PARAM init_param = {};  // under tavo_jni_mutex; path is null outside tavo_init
 
-// True on a worker thread while it posts an event: a deinit from there must not wait for the lock
-// that a deinit elsewhere holds while it waits for this very thread.
-thread_local bool posting = false;
+// The thread that is posting an event, or none: a deinit from there must not wait for the lock that
+// a deinit elsewhere holds while it waits for this very thread. Atomic access only.
+pthread_t posting_thread = {};
 
 template <typename T>
 T *load_pointer(T *const *pointer) {
@@ -54,17 +54,30 @@ void store_pointer(T **pointer, T *value) {
     __atomic_store_n(pointer, value, __ATOMIC_RELEASE);
 }
 
+void mark_posting(pthread_t thread) {
+    __atomic_store_n(&posting_thread, thread, __ATOMIC_RELEASE);
+}
+
+bool is_posting() {
+    const pthread_t thread = __atomic_load_n(&posting_thread, __ATOMIC_ACQUIRE);
+    return pthread_equal(thread, pthread_self()) != 0;
+}
+
 long handle_value(const TAVO_CTX *ctx) {
     return static_cast<long>(reinterpret_cast<intptr_t>(ctx));
 }
 
 // ---- the lock of init and deinit ----
 
-// Creates the lock on first use: of two threads that come first together, both get the same one.
+// Creates the lock on first use: of two threads that come first together, both get the same one. A
+// lock that is there already is used.
 pthread_mutex_t *lock_for_init() {
-    store_pointer(&tavo_jni_mutex, &lifecycle_mutex);
-    pthread_mutex_lock(&lifecycle_mutex);
-    return &lifecycle_mutex;
+    pthread_mutex_t *mutex = nullptr;
+    const bool created = __atomic_compare_exchange_n(&tavo_jni_mutex, &mutex, &lifecycle_mutex,
+                                                     false, __ATOMIC_ACQ_REL, __ATOMIC_ACQUIRE);
+    if (created) mutex = &lifecycle_mutex;
+    pthread_mutex_lock(mutex);
+    return mutex;
 }
 
 // Null, and nothing locked, when no init has ever run.
@@ -120,16 +133,21 @@ host_refs *make_host(JNIEnv *env, jclass host_class, jobject obj) {
 
 // ---- init ----
 
-// Null when the class or the method is missing; the exception that says so is cleared.
-jmethodID find_post_event(JNIEnv *env) {
-    jmethodID method = nullptr;
-    jclass host_class = env->FindClass(kHostClass);
-    if (host_class != nullptr) {
-        method = env->GetStaticMethodID(host_class, kPostEvent, kPostEventSignature);
-        env->DeleteLocalRef(host_class);
-    }
-    if (method == nullptr) env->ExceptionClear();
+// Finds the callback in the class and keeps it. Null when there is none; an exception is then
+// pending.
+jmethodID find_post_event(JNIEnv *env, jclass host_class) {
+    jmethodID method = env->GetStaticMethodID(host_class, kPostEvent, kPostEventSignature);
+    if (method != nullptr) store_pointer(&post_event, method);
     return method;
+}
+
+// False when the class or its callback is missing; the exception that says so is cleared.
+bool look_up_host(JNIEnv *env) {
+    jclass host_class = env->FindClass(kHostClass);
+    const bool found = host_class != nullptr && find_post_event(env, host_class) != nullptr;
+    if (!found) env->ExceptionClear();
+    if (host_class != nullptr) env->DeleteLocalRef(host_class);
+    return found;
 }
 
 // Under the lock. The characters are the caller's and may be given back once this returns.
@@ -143,12 +161,10 @@ TAVO_CTX *create_instance(const char *path, jint mode, int32_t *err) {
 
 // Under the lock. The handle is published last: whoever sees it may start it.
 jint adopt_instance(JNIEnv *env, TAVO_CTX *ctx) {
-    jmethodID method = find_post_event(env);
-    if (method == nullptr) {
+    if (!look_up_host(env)) {
         tavo_deinit(ctx);
         return TAVO_ERR_HANDLE;
     }
-    store_pointer(&post_event, method);
     tavo_setcallback(ctx, tavocallback);
     store_pointer(&instance, ctx);
     return TAVO_OK;
@@ -164,11 +180,13 @@ jint init_failed(jint code) {
     return code;
 }
 
-// Under the lock, with the path's characters in hand, which it gives back on every way out.
-jint init_locked(JNIEnv *env, jstring path, const char *chars, jint mode) {
-    if (load_pointer(&instance) != nullptr) {
-        env->ReleaseStringUTFChars(path, chars);
-        return already_opened();
+// Under the lock.
+jint init_locked(JNIEnv *env, jstring path, jint mode) {
+    if (load_pointer(&instance) != nullptr) return already_opened();
+    const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
+    if (chars == nullptr) {
+        env->ExceptionClear();
+        return init_failed(TAVO_ERR_HANDLE);
     }
     int32_t err = TAVO_OK;
     TAVO_CTX *ctx = create_instance(chars, mode, &err);
@@ -237,8 +255,7 @@ jfloatArray copy_beats(JNIEnv *env, const TAVO_INFO *info) {
     return beats;
 }
 
-void post(JNIEnv *env, const host_refs *host, const TAVO_INFO *info) {
-    jmethodID method = load_pointer(&post_event);
+void post(JNIEnv *env, const host_refs *host, jmethodID method, const TAVO_INFO *info) {
     const bool has_beats = info->status == 0 && info->beat_count >= 1;
     jfloatArray beats = has_beats ? copy_beats(env, info) : nullptr;
     const bool failed = info->status != 0 || (has_beats && beats == nullptr);
@@ -283,14 +300,9 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobje
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject, jstring path,
                                                      jint mode) {
     // Inside an event there is an instance, and whoever is ending it holds the lock.
-    if (posting && load_pointer(&instance) != nullptr) return already_opened();
-    const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
-    if (chars == nullptr) {
-        env->ExceptionClear();
-        return init_failed(TAVO_ERR_HANDLE);
-    }
+    if (is_posting() && load_pointer(&instance) != nullptr) return already_opened();
     pthread_mutex_t *mutex = lock_for_init();
-    const jint result = init_locked(env, path, chars, mode);
+    const jint result = init_locked(env, path, mode);
     unlock(mutex);
     return result;
 }
@@ -310,7 +322,7 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *, jobject, jint 
 }
 
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *, jobject) {
-    TAVO_CTX *posting_ctx = posting ? load_pointer(&instance) : nullptr;
+    TAVO_CTX *posting_ctx = is_posting() ? load_pointer(&instance) : nullptr;
     if (posting_ctx != nullptr) return deinit_failed(posting_ctx, TAVO_ERR_HANDLE);
     pthread_mutex_t *mutex = lock_for_deinit();
     const jint result = deinit_locked();
@@ -328,11 +340,13 @@ void tavocallback(TAVO_INFO *info) {
         return;
     }
     host_refs *host = hold_host();
-    if (host != nullptr && load_pointer(&post_event) != nullptr) {
-        posting = true;
-        post(env, host, info);
-        posting = false;
-    } else {  // native_setup or init never came: nobody to tell but the log
+    jmethodID method = load_pointer(&post_event);
+    if (method == nullptr && host != nullptr) method = find_post_event(env, host->host_class);
+    if (method != nullptr && host != nullptr) {
+        mark_posting(pthread_self());
+        post(env, host, method, info);
+        mark_posting({});
+    } else {  // no host class, or none with the callback: nobody to tell but the log
         notification_failed(env);
     }
     drop_host(env, host);

@@ -1,35 +1,23 @@
 #include <gtest/gtest.h>
-#include <unistd.h>
 
-#include <chrono>
+#include <atomic>
 #include <cstring>
 #include <thread>
 
 #include "core/lifecycle.h"
 #include "media_source/mtsrc_ctx.h"
 #include "pcm/decode.h"
+#include "tests/core/core_song.h"
+#include "tests/core/refused.h"
 #include "tests/support/job_harness.h"
-#include "tests/support/song.h"
 
 namespace {
 
 constexpr int32_t kModes[] = {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH};
 
-// One song for all cases: 24 s at 120 BPM, loud from 8 s on.
 TAVO_CTX *create(int32_t mode) {
-    static const std::string path = [] {
-        support::song_spec plan;
-        plan.seconds = 24.0;
-        plan.rate = 22050;
-        plan.loud_at = 8.0;
-        plan.tail_at = 22.0;
-        const std::string name =
-            testing::TempDir() + "tavo_lifecycle" + std::to_string(getpid()) + ".wav";
-        EXPECT_TRUE(support::write_wav(name, support::make_song(plan)));
-        return name;
-    }();
     int32_t err = 99;
-    TAVO_CTX *ctx = job::create(path, mode, &err);
+    TAVO_CTX *ctx = job::create(core_song::path(), mode, &err);
     EXPECT_EQ(err, 0);
     return ctx;
 }
@@ -48,19 +36,35 @@ TEST(Lifecycle, CreationMakesWhatTheModeNeeds) {
             EXPECT_EQ(ctx->onset->frame_size, 512);
             EXPECT_EQ(ctx->onset->hop_size, 256);
         }
-        EXPECT_EQ(ctx->seg_count, 4);
-        EXPECT_EQ(ctx->duration, 240'000'000);
+        EXPECT_EQ(_tavo_quit(ctx), 0);  // no job: nothing to stop
+        EXPECT_EQ(ctx->quit, 0);
         EXPECT_EQ(tavo_deinit(ctx), 0);
         EXPECT_EQ(job::last.calls, 0);
     }
 }
 
-TEST(Lifecycle, UnusableFilesAreOneCode) {
-    for (const std::string &path : {testing::TempDir() + "tavo_missing.wav", testing::TempDir()}) {
+TEST(Lifecycle, CreationFailsWithOneCode) {
+    const struct {
+        std::string path;
+        uint32_t mutexes, conditions;
+    } cases[] = {
+        {core_song::path() + ".missing", 0, 0},
+        {testing::TempDir(), 0, 0},
+        {core_song::path(), 1, 0},
+        {core_song::path(), 0, 1},
+        {core_song::path(), 2, 0},  // the decoding's
+        {core_song::path(), 0, 2},
+    };
+    for (const auto &each : cases) {
+        SCOPED_TRACE(each.path + std::to_string(each.mutexes) + std::to_string(each.conditions));
+        refused::mutexes = each.mutexes;
+        refused::conditions = each.conditions;
         int32_t err = 99;
-        EXPECT_EQ(job::create(path, TAVO_MODE_BOTH, &err), nullptr) << path;
-        EXPECT_EQ(err, -4) << path;
+        EXPECT_EQ(job::create(each.path, TAVO_MODE_BOTH, &err), nullptr);
+        EXPECT_EQ(err, -4);
     }
+    refused::mutexes = refused::conditions = 0;
+    EXPECT_EQ(tavo_init(nullptr, nullptr), nullptr);
 }
 
 TEST(Lifecycle, BadHandlesTouchNothing) {
@@ -76,7 +80,7 @@ TEST(Lifecycle, BadHandlesTouchNothing) {
     EXPECT_EQ(wrong.quit, 0);
 }
 
-TEST(Lifecycle, UnknownModeStartsNothing) {
+TEST(Lifecycle, AJobThatCannotStartLeavesTheInstanceReady) {
     for (int32_t mode : {-1, 3}) {
         TAVO_CTX *ctx = create(mode);
         ASSERT_NE(ctx, nullptr);
@@ -84,31 +88,52 @@ TEST(Lifecycle, UnknownModeStartsNothing) {
         EXPECT_EQ(ctx->state, 1);
         EXPECT_EQ(tavo_deinit(ctx), 0);
     }
+    TAVO_CTX *ctx = create(TAVO_MODE_HIGHLIGHT);
+    ASSERT_NE(ctx, nullptr);
+    refused::threads = 1;
+    EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -2);
+    EXPECT_EQ(ctx->state, 1);
+    EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+    EXPECT_EQ(job::wait().status, 0);
+    EXPECT_EQ(tavo_deinit(ctx), 0);
 }
 
-// While a job runs and in its callback, before which the final state is set: no second start, and
-// a release waits for the callback.
+// Inside the callback, where the state is final: no second start, no release; and a release from
+// outside waits until the callback has returned.
+struct {
+    TAVO_CTX *ctx;
+    std::atomic<bool> entered, left;
+    int32_t deinit_code;
+} visit;
+
+void stay_until_waited_for(TAVO_INFO *) {
+    visit.deinit_code = tavo_deinit(visit.ctx);
+    visit.entered = true;
+    while (pthread_mutex_trylock(&tavo_mutex) == 0) {  // held by the tavo_deinit that joins
+        pthread_mutex_unlock(&tavo_mutex);
+        std::this_thread::yield();
+    }
+    visit.left = true;
+}
+
 TEST(Lifecycle, AJobIsNotStartedTwiceAndReleasedAfterItsCallback) {
     for (int32_t mode : kModes) {
         SCOPED_TRACE(mode);
         TAVO_CTX *ctx = create(mode);
         ASSERT_NE(ctx, nullptr);
-        job::hold = true;
+        visit.ctx = ctx;
+        visit.entered = visit.left = false;
+        job::inside = stay_until_waited_for;
         ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
         EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -5);
-        EXPECT_EQ(job::wait().status, 0);
+        while (!visit.entered) std::this_thread::yield();
+        EXPECT_EQ(visit.deinit_code, -4);
         EXPECT_EQ(load_flag(&ctx->state), 3);
         EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -5);
-        bool released = false;
-        std::thread releaser([&released] {
-            std::this_thread::sleep_for(std::chrono::milliseconds(30));
-            released = true;
-            job::release();
-        });
         EXPECT_EQ(tavo_deinit(ctx), 0);
-        EXPECT_TRUE(released);
-        releaser.join();
+        EXPECT_TRUE(visit.left);
         EXPECT_EQ(job::last.calls, 1);
+        EXPECT_EQ(job::last.status, 0);
     }
 }
 
@@ -120,21 +145,35 @@ int32_t read_once_stopped(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
     return read_behind_gate(src, want, frame);
 }
 
-// A stop that arrives while decoding waits for it, then costs the beats but not the highlight.
-TEST(Lifecycle, StopDuringDecodingEndsBeforeTheBeats) {
+// A stop that arrives while decoding waits for it, then costs the beats but not the highlight. The
+// watcher that waits for the end may be refused its thread.
+TEST(Lifecycle, AStopDuringDecodingEndsBeforeTheBeats) {
     for (int32_t mode : kModes) {
-        SCOPED_TRACE(mode);
-        TAVO_CTX *ctx = create(mode);
-        ASSERT_NE(ctx, nullptr);
-        gated = ctx;
-        read_behind_gate = ctx->seg[0].src->get_frm;
-        for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].src->get_frm = read_once_stopped;
-        ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
-        EXPECT_EQ(tavo_deinit(ctx), 0);
-        EXPECT_EQ(job::last.calls, 1);
-        EXPECT_EQ(job::last.status, mode == TAVO_MODE_HIGHLIGHT ? 0 : -1);
-        EXPECT_EQ(job::last.beat_count, 0);
-        EXPECT_TRUE(job::last.null_beats);
+        for (uint32_t no_watcher : {0u, 1u}) {
+            SCOPED_TRACE(testing::Message() << mode << no_watcher);
+            TAVO_CTX *ctx = create(mode);
+            ASSERT_NE(ctx, nullptr);
+            gated = ctx;
+            read_behind_gate = ctx->seg[0].src->get_frm;
+            for (int32_t i = 0; i < ctx->seg_count; ++i) {
+                ctx->seg[i].src->get_frm = read_once_stopped;
+            }
+            // The job's thread, its four, then the watcher: they come in this order.
+            refused::threads = no_watcher << 5;
+            ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+            while (refused::threads > no_watcher) std::this_thread::yield();
+            EXPECT_EQ(tavo_deinit(ctx), 0);
+            EXPECT_EQ(refused::threads, 0u);
+            EXPECT_EQ(job::last.calls, 1);
+            EXPECT_EQ(job::last.status, mode == TAVO_MODE_HIGHLIGHT ? 0 : -1);
+            if (mode == TAVO_MODE_BEATS) {
+                EXPECT_EQ(job::last.hl_pos, 0);
+            } else {
+                EXPECT_NEAR(job::last.hl_pos, 41'000, 1000);
+            }
+            EXPECT_EQ(job::last.beat_count, 0);
+            EXPECT_TRUE(job::last.null_beats);
+        }
     }
 }
 

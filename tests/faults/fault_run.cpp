@@ -97,10 +97,10 @@ const char *flaw_of(const job::result &found, int32_t mode, double song_ms) {
 }
 
 // The first calls of a kind, whose failure tavo_init reports as out of memory: the instance, its
-// result and the records of its mode; its own lock.
+// result and the records of its mode.
 int64_t memory_places(const subject &of, const plan &by) {
-    if (by.what == call::allocation) return of.mode == TAVO_MODE_BOTH ? 4 : 3;
-    return by.what == call::mutex || by.what == call::condition ? 1 : 0;
+    if (by.what != call::allocation) return 0;
+    return of.mode == TAVO_MODE_BOTH ? 4 : 3;
 }
 
 // Null when a run ended as the interface says. The number of callbacks is looked at elsewhere.

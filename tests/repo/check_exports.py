@@ -1,6 +1,7 @@
 #!/usr/bin/env python3
 """check_exports.py LIBRARY NAMES: the library's dynamic symbols are the names listed, no others,
-and it asks for no shared library beyond those that it may need."""
+it asks for no shared library beyond those that it may need, and it has no thread-local storage,
+whose first use in a loaded library takes memory that may not be there."""
 import subprocess
 import sys
 
@@ -36,10 +37,13 @@ def main():
     foreign = [name for name in needed if not name.startswith(NEEDED)]
     for name in foreign:
         print(f"needs {name}")
+    thread_local = "TLS" in run("readelf", "-lW", library).split()
+    if thread_local:
+        print("has thread-local storage")
     if not listed or not needed:
         print("nothing to compare")
         return 1
-    return 1 if missing or extra or foreign else 0
+    return 1 if missing or extra or foreign or thread_local else 0
 
 
 if __name__ == "__main__":

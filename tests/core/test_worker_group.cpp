@@ -1,26 +1,9 @@
 #include <gtest/gtest.h>
 
-#include <cerrno>
 #include <numeric>
 
 #include "common/worker_group.h"
-
-namespace {
-
-int refused_threads = 0;  // bit i: the i-th start
-int thread_starts = 0;
-
-}  // namespace
-
-extern "C" {
-int __real_pthread_create(pthread_t *, const pthread_attr_t *, void *(*)(void *), void *);
-int __wrap_pthread_create(pthread_t *thread, const pthread_attr_t *attr, void *(*entry)(void *),
-                          void *arg) {
-    const int start = thread_starts++;
-    if ((refused_threads >> start & 1) != 0) return EAGAIN;
-    return __real_pthread_create(thread, attr, entry, arg);
-}
-}
+#include "tests/core/refused.h"
 
 namespace {
 
@@ -63,8 +46,14 @@ void *enter(void *record) {
     run_worker(record, work, report);
 }
 
-TEST(worker_group, every_worker_runs_once_whatever_can_be_started) {
+TEST(WorkerGroup, EveryWorkerRunsOnceWhateverCanBeStarted) {
     group all;
+    for (refused::calls *lock : {&refused::mutexes, &refused::conditions}) {
+        *lock = 1;
+        EXPECT_EQ(worker_lock_create(&all.mutex, &all.cond), -2);
+        EXPECT_EQ(all.mutex, nullptr);
+        EXPECT_EQ(all.cond, nullptr);
+    }
     ASSERT_EQ(worker_lock_create(&all.mutex, &all.cond), 0);
     worker_slot slots[4];
     for (int32_t i = 0; i < 4; ++i) {
@@ -74,12 +63,10 @@ TEST(worker_group, every_worker_runs_once_whatever_can_be_started) {
     for (int round = 0; round < 512; ++round) {  // the flags of one round are stale in the next
         const int mask = round % 16;
         SCOPED_TRACE(mask);
-        refused_threads = mask;
-        thread_starts = 0;
+        refused::threads = static_cast<uint32_t>(mask);
         all.finished = 0;
         worker_group_run(slots, 4, all.mutex, all.cond, all.done);
 
-        ASSERT_EQ(thread_starts, 4);
         ASSERT_EQ(all.finished, 4);
         ASSERT_EQ(all.stale_flags, 0);
         for (int i = 0; i < 4; ++i) {
