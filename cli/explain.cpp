@@ -26,15 +26,15 @@ struct type_name {
     const char *name;
 };
 constexpr type_name kTypeNames[] = {
-    {kTypeMp4, "MP4"},
-    {kTypeAsf, "ASF (Windows Media)"},
-    {kTypeOgg, "Ogg"},
-    {kTypeWav, "WAV"},
-    {kTypeAac, "AAC"},
-    {kTypeMpegLayer1, "MPEG audio Layer I"},
-    {kTypeMpegLayer2, "MPEG audio Layer II"},
-    {kTypeMpegLayer3, "MP3"},
-    {kTypeFlac, "FLAC"},
+    {kMtsrcTypeMp4, "MP4"},
+    {kMtsrcTypeAsf, "ASF (Windows Media)"},
+    {kMtsrcTypeOgg, "Ogg"},
+    {kMtsrcTypeWav, "WAV"},
+    {kMtsrcTypeAac, "AAC"},
+    {kMtsrcTypeMpegLayer1, "MPEG audio Layer I"},
+    {kMtsrcTypeMpegLayer2, "MPEG audio Layer II"},
+    {kMtsrcTypeMpegLayer3, "MP3"},
+    {kMtsrcTypeFlac, "FLAC"},
 };
 
 std::string name_of(int32_t type) {
@@ -46,14 +46,7 @@ std::string name_of(int32_t type) {
 
 mtsrc_io file_callbacks(char *path) {
     mtsrc_io io{};
-    io.open = mtsrc_file_open;
-    io.close = mtsrc_file_close;
-    io.read = mtsrc_file_read;
-    io.write = mtsrc_file_write;
-    io.tell = mtsrc_file_tell;
-    io.seek = mtsrc_file_seek;
-    io.skip = mtsrc_file_skip;
-    io.size = mtsrc_file_size;
+    mtsrc_file_callbacks(&io);
     io.path = path;
     return io;
 }
@@ -99,14 +92,14 @@ std::string explain_source_code(const std::string &path, int32_t type, int32_t c
         case TAVO_ERR_MEMORY:
             return "There is not enough memory to open the file.";
         case TAVO_ERR_FORMAT:
-            if (type == kTypeWav) return explain_wav(path);
-            if (type == kTypeMp4) {
+            if (type == kMtsrcTypeWav) return explain_wav(path);
+            if (type == kMtsrcTypeMp4) {
                 return "The MP4 file's audio is neither AAC nor MP3, or its sample rate is not "
                        "within 8000 to 48000 Hz.";
             }
             return what + "has a sample rate that is not read; 8000 to 48000 Hz are.";
         case TAVO_ERR_OPEN:
-            if (type == kTypeOgg) {
+            if (type == kMtsrcTypeOgg) {
                 return "The Ogg file has no usable audio stream; only Vorbis is read from Ogg.";
             }
             return what + "has no usable audio stream.";
@@ -141,7 +134,7 @@ int recognise(const std::string &path, int32_t &type) {
 }
 
 bool is_audio(int32_t type) {
-    return type != kTypeUnknown;
+    return type != kMtsrcTypeUnknown;
 }
 
 std::string explain_before_open(const std::string &path) {
@@ -169,12 +162,13 @@ std::string explain_before_open(const std::string &path) {
 
 std::string explain_unusable(const std::string &library_path, int32_t code, record &about) {
     if (code == TAVO_ERR_MEMORY) return "There is not enough memory to analyse the file.";
-    int32_t type = kTypeUnknown;
+    int32_t type = kMtsrcTypeUnknown;
     const int recognised = recognise(library_path, type);
     if (recognised > 0) return system_sentence("The file cannot be read", recognised);
     if (recognised < 0) return "The file cannot be read far enough to tell what it is.";
-    if (type == kTypeUnknown) return "The file is not recognised as audio of a known format.";
-    if (type == kTypeAsf) return "The file is " + name_of(type) + ", a format that is refused.";
+    if (type == kMtsrcTypeUnknown) return "The file is not recognised as audio of a known format.";
+    if (type == kMtsrcTypeAsf)
+        return "The file is " + name_of(type) + ", a format that is refused.";
 
     const mtsrc_param param{library_path.c_str()};
     int32_t error = 0;

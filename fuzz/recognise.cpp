@@ -26,16 +26,16 @@ int64_t most_calls(size_t bytes) {
 
 bool is_type(int32_t type) {
     switch (type) {
-        case kTypeMp4:
-        case kTypeAsf:
-        case kTypeOgg:
-        case kTypeWav:
-        case kTypeAac:
-        case kTypeMpegLayer1:
-        case kTypeMpegLayer2:
-        case kTypeMpegLayer3:
-        case kTypeFlac:
-        case kTypeUnknown:
+        case kMtsrcTypeMp4:
+        case kMtsrcTypeAsf:
+        case kMtsrcTypeOgg:
+        case kMtsrcTypeWav:
+        case kMtsrcTypeAac:
+        case kMtsrcTypeMpegLayer1:
+        case kMtsrcTypeMpegLayer2:
+        case kMtsrcTypeMpegLayer3:
+        case kMtsrcTypeFlac:
+        case kMtsrcTypeUnknown:
             return true;
         default:
             return false;

@@ -29,8 +29,8 @@ struct source {
 };
 
 bool is_served(int32_t type) {
-    return type == FUZZ_TYPE ||
-           (FUZZ_TYPE == kTypeMpegLayer3 && (type == kTypeMpegLayer1 || type == kTypeMpegLayer2));
+    return type == FUZZ_TYPE || (FUZZ_TYPE == kMtsrcTypeMpegLayer3 &&
+                                 (type == kMtsrcTypeMpegLayer1 || type == kMtsrcTypeMpegLayer2));
 }
 
 // Samples before a time that the source reported.
@@ -152,7 +152,7 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     const fuzz::memory_file *file = fuzz::set_memory_file(in.at, in.left);
     const mtsrc_io io = fuzz::memory_io();
     mtsrc_file *probe = io.open(&io, 0);
-    int32_t type = kTypeUnknown;
+    int32_t type = kMtsrcTypeUnknown;
     mtsrc_get_file_type(&io, probe, &type);
     io.close(probe);
     if (!is_served(type)) return 0;

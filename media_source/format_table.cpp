@@ -3,22 +3,22 @@
 namespace {
 
 constexpr format_ops kFormats[] = {
-    {kTypeMp4, mtsource_mp4a_open, mtsource_mp4a_close, mtsource_mp4a_get_frm, mtsource_mp4a_seek,
-     mtsource_mp4a_reset},
-    {kTypeOgg, mtsource_ogg_open, mtsource_ogg_close, mtsource_ogg_get_frm, mtsource_ogg_seek,
+    {kMtsrcTypeMp4, mtsource_mp4a_open, mtsource_mp4a_close, mtsource_mp4a_get_frm,
+     mtsource_mp4a_seek, mtsource_mp4a_reset},
+    {kMtsrcTypeOgg, mtsource_ogg_open, mtsource_ogg_close, mtsource_ogg_get_frm, mtsource_ogg_seek,
      mtsource_ogg_reset},
-    {kTypeWav, mtsource_wav_open, mtsource_wav_close, mtsource_wav_get_frm, mtsource_wav_seek,
+    {kMtsrcTypeWav, mtsource_wav_open, mtsource_wav_close, mtsource_wav_get_frm, mtsource_wav_seek,
      mtsource_wav_reset},
-    {kTypeAac, mtsource_aac_open, mtsource_aac_close, mtsource_aac_get_frm, mtsource_aac_seek,
+    {kMtsrcTypeAac, mtsource_aac_open, mtsource_aac_close, mtsource_aac_get_frm, mtsource_aac_seek,
      mtsource_aac_reset},
-    {kTypeMpegLayer1, mtsource_mp123_open, mtsource_mp123_close, mtsource_mp123_get_frm,
+    {kMtsrcTypeMpegLayer1, mtsource_mp123_open, mtsource_mp123_close, mtsource_mp123_get_frm,
      mtsource_mp123_seek, mtsource_mp123_reset},
-    {kTypeMpegLayer2, mtsource_mp123_open, mtsource_mp123_close, mtsource_mp123_get_frm,
+    {kMtsrcTypeMpegLayer2, mtsource_mp123_open, mtsource_mp123_close, mtsource_mp123_get_frm,
      mtsource_mp123_seek, mtsource_mp123_reset},
-    {kTypeMpegLayer3, mtsource_mp123_open, mtsource_mp123_close, mtsource_mp123_get_frm,
+    {kMtsrcTypeMpegLayer3, mtsource_mp123_open, mtsource_mp123_close, mtsource_mp123_get_frm,
      mtsource_mp123_seek, mtsource_mp123_reset},
-    {kTypeFlac, mtsource_flac_open, mtsource_flac_close, mtsource_flac_get_frm, mtsource_flac_seek,
-     mtsource_flac_reset},
+    {kMtsrcTypeFlac, mtsource_flac_open, mtsource_flac_close, mtsource_flac_get_frm,
+     mtsource_flac_seek, mtsource_flac_reset},
 };
 
 }  // namespace

@@ -31,7 +31,7 @@ mtsrc_ctx *new_handle(const mtsrc_io *io) {
     }
     pcm_queue_clear(src);
     src->io = *io;
-    src->codec = kTypeUnknown;
+    src->codec = kMtsrcTypeUnknown;
     return src;
 }
 
@@ -80,14 +80,7 @@ mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err) {
         return nullptr;
     }
     mtsrc_io io = {};
-    io.open = mtsrc_file_open;
-    io.close = mtsrc_file_close;
-    io.read = mtsrc_file_read;
-    io.write = mtsrc_file_write;
-    io.tell = mtsrc_file_tell;
-    io.seek = mtsrc_file_seek;
-    io.skip = mtsrc_file_skip;
-    io.size = mtsrc_file_size;
+    mtsrc_file_callbacks(&io);
     io.path = static_cast<char *>(calloc(1, kPathBytes));
     const size_t length = strnlen(param->path, kPathBytes);
     if (!io.path || length >= kPathBytes) {

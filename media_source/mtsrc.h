@@ -32,16 +32,16 @@ struct mtsrc_frame {
 };
 
 // Type codes of recognition.
-constexpr int32_t kTypeMp4 = 2000;        ///< MP4
-constexpr int32_t kTypeAsf = 2002;        ///< ASF, which no source reads
-constexpr int32_t kTypeOgg = 2005;        ///< Ogg
-constexpr int32_t kTypeWav = 2006;        ///< RIFF WAVE
-constexpr int32_t kTypeAac = 2007;        ///< AAC as ADTS or ADIF
-constexpr int32_t kTypeMpegLayer1 = 303;  ///< MPEG audio Layer I
-constexpr int32_t kTypeMpegLayer2 = 304;  ///< MPEG audio Layer II
-constexpr int32_t kTypeMpegLayer3 = 305;  ///< MPEG audio Layer III
-constexpr int32_t kTypeFlac = 322;        ///< FLAC
-constexpr int32_t kTypeUnknown = 2199;    ///< nothing fits
+constexpr int32_t kMtsrcTypeMp4 = 2000;        ///< MP4
+constexpr int32_t kMtsrcTypeAsf = 2002;        ///< ASF, which no source reads
+constexpr int32_t kMtsrcTypeOgg = 2005;        ///< Ogg
+constexpr int32_t kMtsrcTypeWav = 2006;        ///< RIFF WAVE
+constexpr int32_t kMtsrcTypeAac = 2007;        ///< AAC as ADTS or ADIF
+constexpr int32_t kMtsrcTypeMpegLayer1 = 303;  ///< MPEG audio Layer I
+constexpr int32_t kMtsrcTypeMpegLayer2 = 304;  ///< MPEG audio Layer II
+constexpr int32_t kMtsrcTypeMpegLayer3 = 305;  ///< MPEG audio Layer III
+constexpr int32_t kMtsrcTypeFlac = 322;        ///< FLAC
+constexpr int32_t kMtsrcTypeUnknown = 2199;    ///< nothing fits
 
 extern "C" {
 
@@ -74,7 +74,7 @@ int32_t mtsrc_reset(mtsrc_ctx *src);
 /// Releases everything. Returns -5 (done); -4 bad handle.
 int32_t mtsrc_deinit(mtsrc_ctx *src);
 
-/// Recognises an open file by its content. Returns 0 with *type set (kTypeUnknown when nothing
+/// Recognises an open file by its content. Returns 0 with *type set (kMtsrcTypeUnknown when nothing
 /// fits) and the file offset where it was; -6 when 16 bytes cannot be read.
 int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type);
 

@@ -55,4 +55,16 @@ int32_t mtsrc_file_size(mtsrc_file *file, int64_t *length);
 /// @}
 }
 
+/// Sets the eight callbacks of *io to the functions above and leaves its other fields alone.
+inline void mtsrc_file_callbacks(mtsrc_io *io) {
+    io->open = mtsrc_file_open;
+    io->close = mtsrc_file_close;
+    io->read = mtsrc_file_read;
+    io->write = mtsrc_file_write;
+    io->tell = mtsrc_file_tell;
+    io->seek = mtsrc_file_seek;
+    io->skip = mtsrc_file_skip;
+    io->size = mtsrc_file_size;
+}
+
 #endif

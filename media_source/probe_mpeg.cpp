@@ -121,7 +121,7 @@ int32_t try_candidate(const scan &s, int32_t at) {
     const int32_t padding = !header.padded ? 0 : header.layer == kLayer1 ? 4 : 1;
     const int32_t next = at + length + padding;
     if (next >= kNextHeaderEnd) {
-        return kTypeUnknown;
+        return kMtsrcTypeUnknown;
     }
     if (next + kHeaderBytes > s.got || !parse(s.buf + next, &header)) {
         return 0;
@@ -131,14 +131,14 @@ int32_t try_candidate(const scan &s, int32_t at) {
 
 int32_t run_scan(scan *s) {
     if (!refill(s)) {
-        return kTypeUnknown;
+        return kMtsrcTypeUnknown;
     }
     uint32_t window = 0;  // the four bytes up to k
     for (int32_t k = 0; k < s->got; ++k) {
         window = window << 8 | s->buf[k];
         if (window >= 0x49443302 && window <= 0x49443304) {  // "ID3", version 2 to 4
             if (!skip_tag(s, k - 3)) {
-                return kTypeUnknown;
+                return kMtsrcTypeUnknown;
             }
             window = 0;
             k = -1;
@@ -150,7 +150,7 @@ int32_t run_scan(scan *s) {
             return answer;
         }
     }
-    return kTypeUnknown;
+    return kMtsrcTypeUnknown;
 }
 
 bool has_transport_sync(const mtsrc_io *io, mtsrc_file *file) {
@@ -174,9 +174,9 @@ bool is_other_container(const uint8_t *head, const mtsrc_io *io, mtsrc_file *fil
 int32_t mtsrc_probe_mpeg(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file) {
     int64_t start = 0;
     if (io->tell(file, &start) != 0 || memcmp(head, "OggS", 4) == 0) {
-        return kTypeUnknown;
+        return kMtsrcTypeUnknown;
     }
-    int32_t answer = kTypeUnknown;
+    int32_t answer = kMtsrcTypeUnknown;
     if (!is_other_container(head, io, file, &start)) {
         scan s = {io, file, static_cast<uint8_t *>(malloc(kScanBytes)), 0};
         if (s.buf) {

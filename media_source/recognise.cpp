@@ -44,10 +44,10 @@ int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type)
         io->seek(file, &start) != 0) {
         return -6;
     }
-    int32_t answer = kTypeUnknown;
+    int32_t answer = kMtsrcTypeUnknown;
     for (const probe ask : kProbes) {
         answer = ask(head, io, file);
-        if (answer != kTypeUnknown) {
+        if (answer != kMtsrcTypeUnknown) {
             break;
         }
     }
@@ -58,19 +58,19 @@ int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type)
 int32_t mtsrc_probe_asf(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file * /*file*/) {
     constexpr uint8_t kHeaderObject[kHeadBytes] = {0x30, 0x26, 0xB2, 0x75, 0x8E, 0x66, 0xCF, 0x11,
                                                    0xA6, 0xD9, 0x00, 0xAA, 0x00, 0x62, 0xCE, 0x6C};
-    return memcmp(head, kHeaderObject, kHeadBytes) == 0 ? kTypeAsf : kTypeUnknown;
+    return memcmp(head, kHeaderObject, kHeadBytes) == 0 ? kMtsrcTypeAsf : kMtsrcTypeUnknown;
 }
 
 int32_t mtsrc_probe_mp4(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file * /*file*/) {
     const bool is_mp4 = is_at(head, 4, "ftyp") || is_at(head, 4, "mdat") || is_at(head, 4, "moov");
-    return is_mp4 ? kTypeMp4 : kTypeUnknown;
+    return is_mp4 ? kMtsrcTypeMp4 : kMtsrcTypeUnknown;
 }
 
 int32_t mtsrc_probe_flac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file) {
     uint8_t bytes[4];
     const bool is_flac =
         peek_behind_tag(head, io, file, bytes, sizeof(bytes)) && is_at(bytes, 0, "fLaC");
-    return is_flac ? kTypeFlac : kTypeUnknown;
+    return is_flac ? kMtsrcTypeFlac : kMtsrcTypeUnknown;
 }
 
 int32_t mtsrc_probe_ogg(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file * /*file*/) {
@@ -78,21 +78,21 @@ int32_t mtsrc_probe_ogg(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file
     constexpr uint8_t kFirstPosition[8] = {};
     const bool is_ogg = is_at(head, 0, "OggS") && head[4] == 0 && head[5] <= kMaxHeaderFlags &&
                         memcmp(head + 6, kFirstPosition, sizeof(kFirstPosition)) == 0;
-    return is_ogg ? kTypeOgg : kTypeUnknown;
+    return is_ogg ? kMtsrcTypeOgg : kMtsrcTypeUnknown;
 }
 
 int32_t mtsrc_probe_wav(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file * /*file*/) {
     const bool is_wav = is_at(head, 0, "RIFF") && is_at(head, 8, "WAVE") && is_at(head, 12, "fmt ");
-    return is_wav ? kTypeWav : kTypeUnknown;
+    return is_wav ? kMtsrcTypeWav : kMtsrcTypeUnknown;
 }
 
 int32_t mtsrc_probe_aac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file) {
     uint8_t bytes[7];
     if (!peek_behind_tag(head, io, file, bytes, sizeof(bytes))) {
-        return kTypeUnknown;
+        return kMtsrcTypeUnknown;
     }
     if (is_at(bytes, 0, "ADIF")) {
-        return kTypeAac;
+        return kMtsrcTypeAac;
     }
     // The ADTS sync word with layer 0: either MPEG version, with or without a checksum.
     switch (bytes[0] << 8 | bytes[1]) {
@@ -100,8 +100,8 @@ int32_t mtsrc_probe_aac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *fil
         case 0xFFF1:
         case 0xFFF8:
         case 0xFFF9:
-            return kTypeAac;
+            return kMtsrcTypeAac;
         default:
-            return kTypeUnknown;
+            return kMtsrcTypeUnknown;
     }
 }

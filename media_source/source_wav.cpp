@@ -49,7 +49,7 @@ int32_t mtsource_wav_open(mtsrc_ctx *src) {
     }
     src->demux = reader;
     src->frm_buf_size = kChunkBytes;
-    src->codec = kTypeWav;
+    src->codec = kMtsrcTypeWav;
     src->format = {info.sample_rate, info.channels, kBitsPerSample, info.duration};
     if (info.sample_rate > kMaxRate || info.channels <= 0) {
         xwavd_delete(reader);

@@ -16,6 +16,10 @@ constexpr int32_t kWexaPcm = 300;      // codec code of linear PCM
 constexpr int32_t kWexaKindAudio = 1;  // kind of a track or stream
 constexpr int32_t kWexaTagAac = 0xFF;  // WAVE format tags of MP4 tracks
 constexpr int32_t kWexaTagMpegLayer3 = 0x55;
+constexpr int32_t kWexaEndOfStream = 1;  // result of a read
+// Sample pairs that the MPEG source drops at the start of a 44.1-kHz stereo stream. A reader's
+// duration and positions count what the source delivers.
+constexpr int32_t kWexaMpegDelay = 529;
 
 // Tags of a file. The record is the library's; the buffers are malloc'ed and the source's to free.
 struct wexa_tag_text {

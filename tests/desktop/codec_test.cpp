@@ -238,14 +238,7 @@ bool reads_consistently(const std::string &path, std::mt19937 &random) {
 
 mtsrc_io io_for(const std::string &path) {
     mtsrc_io io = {};
-    io.open = mtsrc_file_open;
-    io.close = mtsrc_file_close;
-    io.read = mtsrc_file_read;
-    io.write = mtsrc_file_write;
-    io.tell = mtsrc_file_tell;
-    io.seek = mtsrc_file_seek;
-    io.skip = mtsrc_file_skip;
-    io.size = mtsrc_file_size;
+    mtsrc_file_callbacks(&io);
     io.path = const_cast<char *>(path.c_str());  // read only by open
     return io;
 }

@@ -61,10 +61,11 @@ struct memory_file {
 // Only what probes may use.
 inline mtsrc_io probe_io() {
     mtsrc_io io = {};
-    io.read = mtsrc_file_read;
-    io.tell = mtsrc_file_tell;
-    io.seek = mtsrc_file_seek;
-    io.skip = mtsrc_file_skip;
+    mtsrc_file_callbacks(&io);
+    io.open = nullptr;
+    io.close = nullptr;
+    io.write = nullptr;
+    io.size = nullptr;
     return io;
 }
 

@@ -16,7 +16,6 @@
 namespace {
 
 constexpr int32_t kDropRate = 44100;       // Hz
-constexpr int64_t kDropSamples = 529;      // 2116 bytes of stereo
 constexpr int64_t kMaxTagBytes = 1 << 20;  // of an ID3v2 tag looked through
 
 struct mpeg_reader {
@@ -64,7 +63,7 @@ void *xmp123fd_create(const mtsrc_io *io, int64_t * /*word*/, xmp123_info *info,
     }
     const mpeg_header &head = r->stream.head;
     if (head.rate == kDropRate && head.channels == 2) {
-        r->dropped = std::min<int64_t>(kDropSamples, head.samples);
+        r->dropped = std::min<int64_t>(kWexaMpegDelay, head.samples);
     }
     read_tags(r);
     info->sample_rate = head.rate;
