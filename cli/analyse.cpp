@@ -9,6 +9,7 @@
 #include "cli/click.h"
 #include "cli/explain.h"
 #include "cli/library_path.h"
+#include "cli/words.h"
 #include "common/tavo_ctx.h"
 
 namespace {
@@ -18,7 +19,7 @@ namespace {
 std::atomic<bool> result_ready{false};
 int done_write_fd = -1;
 
-void on_result(TAVO_INFO *) {
+void on_result(TAVO_INFO * /*info*/) {
     result_ready.store(true, std::memory_order_release);
     const char done = 1;
     while (write(done_write_fd, &done, 1) < 0 && errno == EINTR) {
@@ -65,7 +66,7 @@ void take_result(const TAVO_CTX *ctx, record &out) {
 }
 
 // Runs the job of an instance and releases it.
-void run_job(TAVO_CTX *ctx, const options &how, int stop_fd, record &out) {
+void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
     take_stream(ctx, out);
     int done_pipe[2];
     if (pipe(done_pipe) != 0) {
@@ -76,7 +77,7 @@ void run_job(TAVO_CTX *ctx, const options &how, int stop_fd, record &out) {
     done_write_fd = done_pipe[1];
     result_ready.store(false);
     tavo_setcallback(ctx, on_result);
-    const int32_t code = tavo_analyze(ctx, how.length_s, how.max_beats, 0);
+    const int32_t code = tavo_analyze(ctx, opts.length_s, opts.max_beats, 0);
     if (code != TAVO_OK) {
         out.error = "The analysis could not be started (code " + std::to_string(code) + ").";
     } else if (wait_for_result(done_pipe[0], stop_fd)) {
@@ -90,15 +91,15 @@ void run_job(TAVO_CTX *ctx, const options &how, int stop_fd, record &out) {
     close(done_pipe[1]);
 }
 
-void analyse_opened(const library_path &opened, const options &how, int stop_fd, record &out) {
-    const TAVO_PARAM param = {opened.path.c_str(), how.mode};
+void analyse_opened(const library_path &opened, const options &opts, int stop_fd, record &out) {
+    const TAVO_PARAM param = {opened.path.c_str(), opts.mode};
     int32_t code = TAVO_OK;
     TAVO_CTX *ctx = tavo_init(&param, &code);
     if (ctx == nullptr) {
         out.error = explain_unusable(opened.path, code, out);
         return;
     }
-    run_job(ctx, how, stop_fd, out);
+    run_job(ctx, opts, stop_fd, out);
 }
 
 }  // namespace
@@ -111,17 +112,17 @@ record failed_record(const std::string &file, int32_t mode, const std::string &e
     return made;
 }
 
-record analyse(const std::string &path, const options &how, int stop_fd) {
-    record out = failed_record(path, how.mode, explain_before_open(path));
-    out.length_s = how.length_s;
+record analyse(const std::string &path, const options &opts, int stop_fd) {
+    record out = failed_record(path, opts.mode, explain_before_open(path));
+    out.length_s = opts.length_s;
     if (!out.error.empty()) return out;
 
     click_file click;
-    out.error = begin_click(click, how.click, path, how.force);
+    out.error = begin_click(click, opts.click, path, opts.force);
     if (!out.error.empty()) return out;
 
     library_path opened = open_library_path(path);
-    analyse_opened(opened, how, stop_fd, out);
+    analyse_opened(opened, opts, stop_fd, out);
     close_library_path(opened);
     const std::string error = finish_click(click, out.status == outcome::ok);
     if (!error.empty()) {

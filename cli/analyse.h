@@ -12,6 +12,6 @@
 
 // stop_fd: becoming readable or closed at its other end stops the analysis through tavo_deinit.
 // Returns when the file's job has ended.
-record analyse(const std::string &path, const options &how, int stop_fd);
+record analyse(const std::string &path, const options &opts, int stop_fd);
 
 #endif

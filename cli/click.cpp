@@ -8,8 +8,8 @@
 #include <cerrno>
 #include <cstdint>
 
-#include "cli/explain.h"
 #include "cli/names.h"
+#include "cli/words.h"
 #include "core/tavo.h"
 
 namespace {

@@ -11,26 +11,16 @@
 std::string format_head(result_format format);
 
 // One record; empty when the format has nothing to say about it on standard output.
-std::string format_record(result_format format, const record &what);
+std::string format_record(result_format format, const record &result);
 
-std::string text_record(const record &what);
-std::string json_record(const record &what);
+std::string text_record(const record &result);
+std::string json_record(const record &result);
 std::string csv_head();
-std::string csv_record(const record &what);
+std::string csv_record(const record &result);
 
 // The label track's content, its path for an input, and the line that names it.
-std::string label_track(const record &what);
+std::string label_track(const record &result);
 std::string label_path(const std::string &input, const std::string &output_dir);
-std::string labels_record(const record &what);
-
-// Words of the interface: highlight, beats, both; ok, failed, stopped.
-const char *mode_word(int32_t mode);
-const char *status_word(outcome status);
-
-// m:ss.t, or h:mm:ss.t from an hour on.
-std::string clock_text(double ms);
-
-// Shortest decimal that gives the same float again.
-std::string number(float value);
+std::string labels_record(const record &result);
 
 #endif

@@ -1,4 +1,5 @@
 #include "cli/format.h"
+#include "cli/words.h"
 
 namespace {
 
@@ -15,7 +16,7 @@ std::string cell(const std::string &value) {
 
 std::string spaced(const std::vector<float> &times) {
     std::string out;
-    for (const float time : times) out += (out.empty() ? "" : " ") + number(time);
+    for (const float time : times) out += (out.empty() ? "" : " ") + number_text(time);
     return out;
 }
 
@@ -26,19 +27,19 @@ std::string csv_head() {
            "error\n";
 }
 
-std::string csv_record(const record &what) {
+std::string csv_record(const record &result) {
     const auto when = [](bool known, int64_t value) {
         return known ? std::to_string(value) : std::string();
     };
-    std::string row = cell(what.file);
-    row += std::string(",") + mode_word(what.mode) + "," + status_word(what.status);
-    row += "," + when(what.has_stream, what.sample_rate);
-    row += "," + when(what.has_stream, what.channels);
-    row += "," + when(what.has_stream, what.duration_ms);
-    row += "," + when(what.has_highlight, what.hl_pos_ms);
-    row += "," + when(what.has_beats, what.bpm);
-    row += "," + when(what.has_beats, static_cast<int64_t>(what.beats_ms.size()));
-    row += "," + spaced(what.beats_ms);
-    row += "," + cell(what.error);
+    std::string row = cell(result.file);
+    row += std::string(",") + mode_word(result.mode) + "," + status_word(result.status);
+    row += "," + when(result.has_stream, result.sample_rate);
+    row += "," + when(result.has_stream, result.channels);
+    row += "," + when(result.has_stream, result.duration_ms);
+    row += "," + when(result.has_highlight, result.hl_pos_ms);
+    row += "," + when(result.has_beats, result.bpm);
+    row += "," + when(result.has_beats, static_cast<int64_t>(result.beats_ms.size()));
+    row += "," + spaced(result.beats_ms);
+    row += "," + cell(result.error);
     return row + "\n";
 }

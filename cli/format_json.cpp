@@ -2,6 +2,7 @@
 
 #include "cli/format.h"
 #include "cli/names.h"
+#include "cli/words.h"
 
 namespace {
 
@@ -13,23 +14,23 @@ using json = nlohmann::basic_json<nlohmann::ordered_map, std::vector, std::strin
 
 // A name that is not UTF-8 cannot stand in JSON: file then has U+FFFD in place of the bytes in
 // question, and file_bytes holds the exact name, percent-encoded.
-std::string json_record(const record &what) {
+std::string json_record(const record &result) {
     json object;
-    object["file"] = as_utf8(what.file);
-    if (!is_utf8(what.file)) object["file_bytes"] = percent_encoded(what.file);
-    object["mode"] = mode_word(what.mode);
-    object["status"] = status_word(what.status);
-    if (what.has_stream) {
-        object["sample_rate"] = what.sample_rate;
-        object["channels"] = what.channels;
-        object["duration_ms"] = what.duration_ms;
+    object["file"] = as_utf8(result.file);
+    if (!is_utf8(result.file)) object["file_bytes"] = percent_encoded(result.file);
+    object["mode"] = mode_word(result.mode);
+    object["status"] = status_word(result.status);
+    if (result.has_stream) {
+        object["sample_rate"] = result.sample_rate;
+        object["channels"] = result.channels;
+        object["duration_ms"] = result.duration_ms;
     }
-    if (what.has_highlight) object["hl_pos_ms"] = what.hl_pos_ms;
-    if (what.has_beats) {
-        object["bpm"] = what.bpm;
-        object["beat_count"] = what.beats_ms.size();
-        object["beats_ms"] = what.beats_ms;
+    if (result.has_highlight) object["hl_pos_ms"] = result.hl_pos_ms;
+    if (result.has_beats) {
+        object["bpm"] = result.bpm;
+        object["beat_count"] = result.beats_ms.size();
+        object["beats_ms"] = result.beats_ms;
     }
-    if (!what.error.empty()) object["error"] = as_utf8(what.error);
+    if (!result.error.empty()) object["error"] = as_utf8(result.error);
     return object.dump() + "\n";
 }

@@ -19,17 +19,17 @@ std::string label(double start_ms, double end_ms, const std::string &name) {
 
 }  // namespace
 
-std::string label_track(const record &what) {
+std::string label_track(const record &result) {
     std::string track;
-    if (what.has_highlight) {
-        const double start = what.hl_pos_ms;
-        const double length = what.length_s > 0 ? 1000.0 * what.length_s : kUsualLengthMs;
-        const double end = std::min(start + length, static_cast<double>(what.duration_ms));
+    if (result.has_highlight) {
+        const double start = result.hl_pos_ms;
+        const double length = result.length_s > 0 ? 1000.0 * result.length_s : kUsualLengthMs;
+        const double end = std::min(start + length, static_cast<double>(result.duration_ms));
         track += label(start, std::max(start, end), "highlight");
     }
     size_t count = 0;
-    for (const float beat : what.beats_ms) {
-        const double at = static_cast<double>(beat);
+    for (const float beat : result.beats_ms) {
+        const auto at = static_cast<double>(beat);
         track += label(at, at, "beat " + std::to_string(++count));
     }
     return track;
@@ -40,6 +40,6 @@ std::string label_path(const std::string &input, const std::string &output_dir) 
     return output_dir + (output_dir.back() == '/' ? "" : "/") + base_name(input) + kSuffix;
 }
 
-std::string labels_record(const record &what) {
-    return what.written.empty() ? "" : shown(what.written) + "\n";
+std::string labels_record(const record &result) {
+    return result.written.empty() ? "" : shown(result.written) + "\n";
 }

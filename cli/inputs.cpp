@@ -10,9 +10,11 @@
 #include <cstdio>
 #include <map>
 
-#include "cli/explain.h"
 #include "cli/format.h"
 #include "cli/names.h"
+#include "cli/recognise.h"
+#include "cli/words.h"
+#include "media_source/mtsrc.h"
 
 namespace {
 
@@ -43,70 +45,70 @@ int list_folder(const std::string &path, std::vector<std::string> &names) {
     return code;
 }
 
-void add_if_audio(search &run, const std::string &path) {
+void add_if_audio(search &walk, const std::string &path) {
     int32_t type = 0;
     const int code = recognise(path, type);
     if (code == EACCES || code == EPERM || code == EIO) {
-        run.found.push_back({path, system_sentence("The file cannot be read", code)});
-    } else if (code == 0 && is_audio(type)) {
-        run.found.push_back({path, ""});
+        walk.found.push_back({path, system_sentence("The file cannot be read", code)});
+    } else if (code == 0 && type != kMtsrcTypeUnknown) {
+        walk.found.push_back({path, ""});
     }
 }
 
-void add_folder(search &run, const std::string &path, bool inner) {
+void add_folder(search &walk, const std::string &path, bool inner) {
     std::vector<std::string> names;
     const int code = list_folder(path, names);
     if (code != 0) {
-        run.found.push_back({path, system_sentence("The folder cannot be read", code)});
+        walk.found.push_back({path, system_sentence("The folder cannot be read", code)});
         return;
     }
-    const size_t before = run.found.size();
+    const size_t before = walk.found.size();
     for (const std::string &name : names) {
-        if (run.stop_requested()) return;
+        if (walk.stop_requested()) return;
         const std::string entry = joined(path, name);
         struct stat info {};
         if (lstat(entry.c_str(), &info) != 0) continue;
         if (S_ISDIR(info.st_mode)) {
-            if (run.from.recursive) add_folder(run, entry, true);
+            if (walk.from.recursive) add_folder(walk, entry, true);
             continue;
         }
         if (S_ISLNK(info.st_mode) && stat(entry.c_str(), &info) != 0) continue;
-        if (S_ISREG(info.st_mode)) add_if_audio(run, entry);
+        if (S_ISREG(info.st_mode)) add_if_audio(walk, entry);
     }
-    if (!inner && run.found.size() == before) {
-        run.found.push_back(
+    if (!inner && walk.found.size() == before) {
+        walk.found.push_back(
             {path, "The folder holds no audio files" +
-                       std::string(run.from.recursive
+                       std::string(walk.from.recursive
                                        ? "."
                                        : " itself; --recursive searches the folders in it.")});
     }
 }
 
-void add_path(search &run, const std::string &path) {
+void add_path(search &walk, const std::string &path) {
     struct stat info {};
     if (stat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) {
-        add_folder(run, path, false);
+        add_folder(walk, path, false);
     } else {
-        run.found.push_back({path, ""});
+        walk.found.push_back({path, ""});
     }
 }
 
-void add_names(search &run, const std::string &text) {
+void add_names(search &walk, const std::string &text) {
     size_t from = 0;
-    while (from < text.size() && !run.stop_requested()) {
-        const size_t end = std::min(text.find(run.from.list_separator, from), text.size());
-        if (end > from) add_path(run, text.substr(from, end - from));
+    while (from < text.size() && !walk.stop_requested()) {
+        const size_t end = std::min(text.find(walk.from.list_separator, from), text.size());
+        if (end > from) add_path(walk, text.substr(from, end - from));
         from = end + 1;
     }
 }
 
-void add_list(search &run, const std::string &list) {
+void add_list(search &walk, const std::string &list) {
     const bool standard_input = list == "-";
     const int fd = standard_input ? STDIN_FILENO : open(list.c_str(), O_RDONLY | O_CLOEXEC);
     int code = fd < 0 ? errno : 0;
     std::string text;
     std::vector<char> part(kReadBytes);
-    while (code == 0 && !run.stop_requested()) {
+    while (code == 0 && !walk.stop_requested()) {
         const ssize_t got = read(fd, part.data(), part.size());
         if (got > 0) text.append(part.data(), static_cast<size_t>(got));
         if (got == 0) break;
@@ -114,25 +116,25 @@ void add_list(search &run, const std::string &list) {
     }
     if (fd >= 0 && !standard_input) close(fd);
     if (code != 0) {
-        run.found.push_back({list, system_sentence("The list of files cannot be read", code)});
+        walk.found.push_back({list, system_sentence("The list of files cannot be read", code)});
         return;
     }
-    if (text.find_first_not_of(run.from.list_separator) == std::string::npos && !run.from.quiet) {
+    if (text.find_first_not_of(walk.from.list_separator) == std::string::npos && !walk.from.quiet) {
         fprintf(stderr, "tavo: the list %s names no files.\n",
                 standard_input ? "on standard input" : shown(list).c_str());
     }
-    add_names(run, text);
+    add_names(walk, text);
 }
 
 // Songs of the same name in different folders meet in one output folder. Which of them is written
 // must not depend on which is analysed first.
-void refuse_shared_tracks(search &run) {
-    if (run.from.format != result_format::labels) return;
+void refuse_shared_tracks(search &walk) {
+    if (walk.from.format != result_format::labels) return;
     std::map<std::string, std::string> owners;  // track to input
-    for (input &entry : run.found) {
+    for (input &entry : walk.found) {
         if (!entry.error.empty()) continue;
         const auto [owner, first] =
-            owners.emplace(label_path(entry.path, run.from.output_dir), entry.path);
+            owners.emplace(label_path(entry.path, walk.from.output_dir), entry.path);
         if (!first) {
             entry.error = "Its label track would replace that of " + shown(owner->second) +
                           ": the names are the same.";
@@ -143,15 +145,15 @@ void refuse_shared_tracks(search &run) {
 }  // namespace
 
 std::vector<input> expand_inputs(const options &from, bool (*stop_requested)()) {
-    search run{from, stop_requested, {}};
+    search walk{from, stop_requested, {}};
     for (const std::string &path : from.inputs) {
         if (path == "-") {
-            add_list(run, path);
+            add_list(walk, path);
         } else {
-            add_path(run, path);
+            add_path(walk, path);
         }
     }
-    for (const std::string &list : from.lists) add_list(run, list);
-    refuse_shared_tracks(run);
-    return run.found;
+    for (const std::string &list : from.lists) add_list(walk, list);
+    refuse_shared_tracks(walk);
+    return walk.found;
 }

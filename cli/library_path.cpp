@@ -3,15 +3,11 @@
 #include <fcntl.h>
 #include <unistd.h>
 
-namespace {
-
-constexpr size_t kLongestPath = 511;  // bytes
-
-}  // namespace
+#include "common/limits.h"
 
 library_path open_library_path(const std::string &path) {
     if (path == "fd") return {"./fd", -1};  // "fd" alone means a descriptor
-    if (path.size() <= kLongestPath) return {path, -1};
+    if (path.size() < kPathBytes) return {path, -1};
     const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
     if (fd < 0) return {path, -1};
     return {"/proc/self/fd/" + std::to_string(fd), fd};

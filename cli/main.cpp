@@ -22,14 +22,14 @@ void hold_standard_streams() {
 
 int run(int argc, char **argv) {
     hold_standard_streams();
-    options how;
-    if (const std::optional<int> status = parse_options(argc, argv, how)) return *status;
+    options opts;
+    if (const std::optional<int> status = parse_options(argc, argv, opts)) return *status;
     if (!watch_for_stop()) {
         perror("tavo");
         return kExitFailed;
     }
-    const std::vector<input> inputs = expand_inputs(how, stop_requested);
-    return run_workers(how, inputs);
+    const std::vector<input> inputs = expand_inputs(opts, stop_requested);
+    return run_workers(opts, inputs);
 }
 
 }  // namespace

@@ -5,9 +5,9 @@
 
 #include <cerrno>
 
-#include "cli/explain.h"
 #include "cli/format.h"
 #include "cli/stop.h"
+#include "cli/words.h"
 
 namespace {
 
@@ -31,13 +31,13 @@ void write_reply(ordered_output &out, const reply &made) {
 
 }  // namespace
 
-ordered_output start_output(const options &how, size_t total) {
+ordered_output start_output(const options &opts, size_t total) {
     ordered_output out;
     out.total = total;
     struct stat info {};
     out.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
-    out.bar = start_progress(total, how.quiet);
-    write_result(out, format_head(how.format));
+    out.bar = start_progress(total, opts.quiet);
+    write_result(out, format_head(opts.format));
     return out;
 }
 

@@ -24,7 +24,7 @@ struct ordered_output {
     progress bar;
 };
 
-ordered_output start_output(const options &how, size_t total);
+ordered_output start_output(const options &opts, size_t total);
 void accept_reply(ordered_output &out, uint32_t index, reply &&made);
 void write_message(ordered_output &out, const std::string &text);
 void note_reader_gone(ordered_output &out);

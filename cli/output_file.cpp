@@ -10,8 +10,8 @@
 #include <cstdio>
 #include <cstdlib>
 
-#include "cli/explain.h"
 #include "cli/names.h"
+#include "cli/words.h"
 
 namespace {
 
@@ -21,11 +21,11 @@ std::string folder_of(const std::string &path) {
     return slash == 0 ? "/" : path.substr(0, slash);
 }
 
-std::string cannot(const std::string &target, int code) {
+std::string write_error(const std::string &target, int code) {
     return system_sentence("The file " + shown(target) + " cannot be written", code);
 }
 
-std::string exists(const std::string &target) {
+std::string already_there(const std::string &target) {
     return "The file " + shown(target) + " exists already; --force overwrites it.";
 }
 
@@ -54,12 +54,12 @@ bool same_file(const std::string &a, const std::string &b) {
 std::string check_target(const std::string &target, bool force) {
     struct stat info {};
     if (lstat(target.c_str(), &info) == 0) {
-        if (S_ISDIR(info.st_mode)) return cannot(target, EISDIR);
-        if (!force) return exists(target);
+        if (S_ISDIR(info.st_mode)) return write_error(target, EISDIR);
+        if (!force) return already_there(target);
     } else if (errno != ENOENT) {
-        return cannot(target, errno);
+        return write_error(target, errno);
     }
-    if (access(folder_of(target).c_str(), W_OK | X_OK) != 0) return cannot(target, errno);
+    if (access(folder_of(target).c_str(), W_OK | X_OK) != 0) return write_error(target, errno);
     return "";
 }
 
@@ -70,7 +70,7 @@ std::string begin_output(output_file &file, const std::string &target) {
     if (file.fd < 0) {
         const int code = errno;
         file.temporary.clear();
-        return cannot(target, code);
+        return write_error(target, code);
     }
     const mode_t mask = umask(0);
     umask(mask);
@@ -81,7 +81,7 @@ std::string begin_output(output_file &file, const std::string &target) {
 std::string write_output(output_file &file, const std::string &content) {
     for (size_t done = 0; done < content.size();) {
         const ssize_t got = write(file.fd, content.data() + done, content.size() - done);
-        if (got < 0 && errno != EINTR) return cannot(file.target, errno);
+        if (got < 0 && errno != EINTR) return write_error(file.target, errno);
         if (got > 0) done += static_cast<size_t>(got);
     }
     return "";
@@ -98,8 +98,8 @@ std::string commit_output(output_file &file, bool force) {
     }
     if (code == 0) file.temporary.clear();
     abandon_output(file);
-    if (code == EEXIST && !force) return exists(file.target);
-    return code == 0 ? "" : cannot(file.target, code);
+    if (code == EEXIST && !force) return already_there(file.target);
+    return code == 0 ? "" : write_error(file.target, code);
 }
 
 void abandon_output(output_file &file) {

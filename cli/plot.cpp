@@ -14,18 +14,18 @@ std::string check_plot(const std::string &target, const std::string &input, bool
     return check_target(target, force);
 }
 
-void draw_plot(record &what, const options &how, int stop_fd) {
+void draw_plot(record &result, const options &opts, int stop_fd) {
     plot_data data;
     std::string error;
-    const outcome read = gather_plot(what, stop_fd, data, error);
+    const outcome read = gather_plot(result, stop_fd, data, error);
     if (read == outcome::ok) {
         output_file file;
-        error = begin_output(file, how.plot);
-        if (error.empty()) error = write_output(file, plot_svg(what, data));
-        if (error.empty()) error = commit_output(file, how.force);
+        error = begin_output(file, opts.plot);
+        if (error.empty()) error = write_output(file, plot_svg(result, data));
+        if (error.empty()) error = commit_output(file, opts.force);
         abandon_output(file);
         if (error.empty()) return;
     }
-    what = failed_record(what.file, what.mode, error);
-    if (read == outcome::stopped) what.status = outcome::stopped;
+    result = failed_record(result.file, result.mode, error);
+    if (read == outcome::stopped) result.status = outcome::stopped;
 }

@@ -34,14 +34,14 @@ struct plot_data {
 // empty string or a sentence.
 std::string check_plot(const std::string &target, const std::string &input, bool force);
 
-// Draws what was found into how.plot. A failure or a stop is entered into the record.
-void draw_plot(record &what, const options &how, int stop_fd);
+// Draws what was found into opts.plot. A failure or a stop is entered into the record.
+void draw_plot(record &result, const options &opts, int stop_fd);
 
-// Reads the sound of what.file once, from its start. Memory does not grow with the sound, but for
+// Reads the sound of result.file once, from its start. Memory does not grow with the sound, but for
 // the loudness: 4 bytes each 2 s. Where reading fails it ends. stop_fd as for analyse.
-outcome gather_plot(const record &what, int stop_fd, plot_data &out, std::string &error);
+outcome gather_plot(const record &result, int stop_fd, plot_data &out, std::string &error);
 
 // The whole SVG document, UTF-8.
-std::string plot_svg(const record &what, const plot_data &data);
+std::string plot_svg(const record &result, const plot_data &data);
 
 #endif

@@ -16,8 +16,6 @@ namespace {
 
 constexpr int32_t kBlockSamples = 4096;  // 8192 bytes: the media source's custom
 constexpr size_t kMostBins = 16384;      // many times the columns: their edges stay sharp
-constexpr int64_t kWindowSeconds = 6;    // of a loudness value
-constexpr int64_t kHopSeconds = 2;       // from one to the next
 
 // Extents of stretches of equal length, which doubles whenever there get to be too many: what the
 // file says of its length need not be true.
@@ -68,7 +66,7 @@ void add_samples(loudness_curve &to, const int16_t *pcm, size_t count, int32_t r
         count -= taken;
         if (to.filled < to.window.size()) return;
         TAVO_HL_CTX curve{};
-        const int64_t size = static_cast<int64_t>(to.window.size());
+        const auto size = static_cast<int64_t>(to.window.size());
         const int32_t made = _calc_power_level(to.window.data(), size, rate, &curve);
         const std::unique_ptr<float, decltype(&free)> owner(curve.power, free);
         if (made != 1) throw std::bad_alloc();
@@ -91,15 +89,15 @@ struct reading {
 };
 
 outcome read_source(mtsrc_ctx *source, int32_t rate, int stop_fd, reading &to) {
-    to.loudness.window.resize(static_cast<size_t>(kWindowSeconds * rate));
-    to.loudness.hop = static_cast<size_t>(kHopSeconds * rate);
+    to.loudness.window.resize(static_cast<size_t>(kPowerWindowSeconds * rate));
+    to.loudness.hop = static_cast<size_t>(kPowerHopSeconds * rate);
     std::array<int16_t, kBlockSamples> block{};
     for (int32_t code = 0; code == 0;) {
         if (stop_asked(stop_fd)) return outcome::stopped;
         mtsrc_frame frame = {block.data(), 0};
         code = mtsrc_getstream(source, static_cast<int32_t>(sizeof(block)), &frame);
         if (code < 0 || frame.size <= 0) break;
-        const size_t count = static_cast<size_t>(frame.size) / sizeof(int16_t);
+        const auto count = static_cast<size_t>(frame.size) / sizeof(int16_t);
         add_samples(to.waveform, block.data(), count);
         add_samples(to.loudness, block.data(), count, rate);
         to.samples += static_cast<int64_t>(count);
@@ -121,9 +119,9 @@ std::vector<extent> columns_of(const bins &from, double axis_samples) {
     std::vector<extent> out;
     const double bins_each = axis_samples / kPlotColumns / static_cast<double>(from.samples_each);
     for (int k = 0; k < kPlotColumns; ++k) {
-        const size_t first = static_cast<size_t>(k * bins_each);
+        const auto first = static_cast<size_t>(k * bins_each);
         if (first >= from.full.size()) break;
-        const size_t end = static_cast<size_t>(std::ceil((k + 1) * bins_each));
+        const auto end = static_cast<size_t>(std::ceil((k + 1) * bins_each));
         extent column = from.full[first];
         for (size_t i = first + 1; i < std::min(end, from.full.size()); ++i) {
             column = joined(column, from.full[i]);
@@ -133,10 +131,10 @@ std::vector<extent> columns_of(const bins &from, double axis_samples) {
     return out;
 }
 
-void fill_plot(const record &what, const reading &from, int32_t rate, plot_data &out) {
+void fill_plot(const record &result, const reading &from, int32_t rate, plot_data &out) {
     out.read_ms = 1000.0 * static_cast<double>(from.samples) / rate;
-    out.length_ms = std::max(out.read_ms, static_cast<double>(what.hl_pos_ms));
-    for (const float beat : what.beats_ms) {
+    out.length_ms = std::max(out.read_ms, static_cast<double>(result.hl_pos_ms));
+    for (const float beat : result.beats_ms) {
         out.length_ms = std::max(out.length_ms, static_cast<double>(beat));
     }
     out.waveform = columns_of(from.waveform, out.length_ms * rate / 1000.0);
@@ -152,10 +150,10 @@ void fill_plot(const record &what, const reading &from, int32_t rate, plot_data 
 
 }  // namespace
 
-outcome gather_plot(const record &what, int stop_fd, plot_data &out, std::string &error) {
+outcome gather_plot(const record &result, int stop_fd, plot_data &out, std::string &error) {
     reading from;
-    library_path opened = open_library_path(what.file);
-    const outcome end = read_sound(opened.path, what.sample_rate, stop_fd, from);
+    library_path opened = open_library_path(result.file);
+    const outcome end = read_sound(opened.path, result.sample_rate, stop_fd, from);
     close_library_path(opened);
     if (end == outcome::stopped) {
         error = "The analysis was stopped.";
@@ -165,6 +163,6 @@ outcome gather_plot(const record &what, int stop_fd, plot_data &out, std::string
         error = "The sound could not be read again for the picture.";
         return outcome::failed;
     }
-    fill_plot(what, from, what.sample_rate, out);
+    fill_plot(result, from, result.sample_rate, out);
     return outcome::ok;
 }

@@ -3,10 +3,10 @@
 #include <cmath>
 #include <cstdio>
 
-#include "cli/format.h"
 #include "cli/names.h"
 #include "cli/plot.h"
 #include "cli/svg.h"
+#include "cli/words.h"
 
 namespace {
 
@@ -55,10 +55,10 @@ constexpr const char *kGridColour = "#DDDDDD";
 // As much of a name as fits, at 16 pixels and bold: other scripts' characters are up to as wide as
 // high.
 std::string fitting(const std::string &bytes, double width) {
-    const std::string text = as_utf8(bytes);
+    std::string text = as_utf8(bytes);
     double used = 0.0;
     for (size_t i = 0; i < text.size(); ++i) {
-        const unsigned char c = static_cast<unsigned char>(text[i]);
+        const auto c = static_cast<unsigned char>(text[i]);
         if ((c & 0xC0) == 0x80) continue;
         used += c < 0x80 ? 11.0 : 17.0;
         if (used > width) return text.substr(0, i) + "\xE2\x80\xA6";
@@ -71,31 +71,32 @@ double x_of(const plot_data &data, double ms) {
     return kLeft + kPlotColumns * std::clamp(part, 0.0, 1.0);
 }
 
-std::string highlight_words(const record &what) {
-    std::string words = "highlight " + clock_text(what.hl_pos_ms);
-    if (what.length_s > 0) {
-        words += " to " + clock_text(what.hl_pos_ms + 1000.0 * what.length_s);
+std::string highlight_words(const record &result) {
+    std::string words = "highlight " + clock_text(result.hl_pos_ms);
+    if (result.length_s > 0) {
+        words += " to " + clock_text(result.hl_pos_ms + 1000.0 * result.length_s);
     }
     return words;
 }
 
-std::string facts(const record &what, const plot_data &data) {
-    std::string words = clock_text(static_cast<double>(what.duration_ms));
-    if (std::fabs(data.read_ms - static_cast<double>(what.duration_ms)) > kSkewMs) {
+std::string facts(const record &result, const plot_data &data) {
+    std::string words = clock_text(static_cast<double>(result.duration_ms));
+    if (std::fabs(data.read_ms - static_cast<double>(result.duration_ms)) > kSkewMs) {
         words += " (" + clock_text(data.read_ms) + " could be read)";
     }
-    words += ", " + std::to_string(what.sample_rate) + " Hz, " + std::to_string(what.channels) +
-             (what.channels == 1 ? " channel" : " channels");
-    if (what.has_highlight) words += ", " + highlight_words(what);
-    if (what.has_beats) {
-        words += ", " + std::to_string(what.bpm) + " BPM, " + std::to_string(what.beats_ms.size()) +
-                 (what.beats_ms.size() == 1 ? " beat" : " beats");
+    words += ", " + std::to_string(result.sample_rate) + " Hz, " + std::to_string(result.channels) +
+             (result.channels == 1 ? " channel" : " channels");
+    if (result.has_highlight) words += ", " + highlight_words(result);
+    if (result.has_beats) {
+        words += ", " + std::to_string(result.bpm) + " BPM, " +
+                 std::to_string(result.beats_ms.size()) +
+                 (result.beats_ms.size() == 1 ? " beat" : " beats");
     }
     return words;
 }
 
-std::string head(const record &what, const plot_data &data) {
-    const std::string name = base_name(what.file);
+std::string head(const record &result, const plot_data &data) {
+    const std::string name = base_name(result.file);
     const std::string width = std::to_string(kWidth);
     const std::string height = std::to_string(kHeight);
     const attributes picture = {{"xmlns", "http://www.w3.org/2000/svg"},
@@ -112,10 +113,10 @@ std::string head(const record &what, const plot_data &data) {
                              {"font-weight", "bold"},
                              {"xml:space", "preserve"}};
     return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n" + opened("svg", picture) + ">\n<title>" +
-           xml(name) + "</title>\n<desc>" + facts(what, data) + "</desc>\n" +
+           xml(name) + "</title>\n<desc>" + facts(result, data) + "</desc>\n" +
            element("rect", {{"width", width}, {"height", height}, {"fill", "#FFFFFF"}}) +
            opened("text", bold) + ">" + xml(fitting(name, kNameWidth)) + "</text>\n" +
-           text_at(kMargin, kFactsY, "start", facts(what, data));
+           text_at(kMargin, kFactsY, "start", facts(result, data));
 }
 
 // Milliseconds between labels of the time axis.
@@ -241,10 +242,10 @@ std::string loudness(const plot_data &data, const lane &in) {
            text_at(kLeft - 6, in.bottom, "end", "0");
 }
 
-std::string region(const record &what, const plot_data &data) {
-    if (!what.has_highlight || what.length_s <= 0) return "";
-    const double start = x_of(data, what.hl_pos_ms);
-    const double end = x_of(data, what.hl_pos_ms + 1000.0 * what.length_s);
+std::string region(const record &result, const plot_data &data) {
+    if (!result.has_highlight || result.length_s <= 0) return "";
+    const double start = x_of(data, result.hl_pos_ms);
+    const double end = x_of(data, result.hl_pos_ms + 1000.0 * result.length_s);
     return element("rect", {{"id", "region"},
                             {"x", decimal(start, 2)},
                             {"y", decimal(kWaveform.top, 1)},
@@ -257,10 +258,10 @@ std::string region(const record &what, const plot_data &data) {
 }
 
 // The label stands at the side of the mark where there is room.
-std::string highlight(const record &what, const plot_data &data) {
-    if (!what.has_highlight) return "";
-    const double x = x_of(data, what.hl_pos_ms);
-    const std::string words = highlight_words(what);
+std::string highlight(const record &result, const plot_data &data) {
+    if (!result.has_highlight) return "";
+    const double x = x_of(data, result.hl_pos_ms);
+    const std::string words = highlight_words(result);
     const bool left = x + kCharacter * static_cast<double>(words.size()) > kWidth - kMargin;
     return named_line("highlight", line(x, kMarkY, x, kAxisY, kHighlightColour, 2, "none")) +
            element("path",
@@ -269,9 +270,9 @@ std::string highlight(const record &what, const plot_data &data) {
 }
 
 // How many beats each stack of kStackWidth pixels holds.
-std::vector<int> stack_heights(const record &what, const plot_data &data) {
+std::vector<int> stack_heights(const record &result, const plot_data &data) {
     std::vector<int> heights(static_cast<size_t>(kPlotColumns / kStackWidth) + 1);
-    for (const float beat : what.beats_ms) {
+    for (const float beat : result.beats_ms) {
         const double x = x_of(data, static_cast<double>(beat)) - kLeft;
         ++heights[static_cast<size_t>(x / kStackWidth)];
     }
@@ -292,22 +293,22 @@ std::string stacked_ticks(const std::vector<int> &heights, int most) {
     return path;
 }
 
-bool too_close(const record &what, const plot_data &data) {
-    if (what.beats_ms.size() < 2) return false;
-    const double span = x_of(data, static_cast<double>(what.beats_ms.back())) -
-                        x_of(data, static_cast<double>(what.beats_ms.front()));
-    return span < kBeatSpace * static_cast<double>(what.beats_ms.size() - 1);
+bool too_close(const record &result, const plot_data &data) {
+    if (result.beats_ms.size() < 2) return false;
+    const double span = x_of(data, static_cast<double>(result.beats_ms.back())) -
+                        x_of(data, static_cast<double>(result.beats_ms.front()));
+    return span < kBeatSpace * static_cast<double>(result.beats_ms.size() - 1);
 }
 
-std::string beats(const record &what, const plot_data &data) {
-    if (!what.has_beats) return "";
+std::string beats(const record &result, const plot_data &data) {
+    if (!result.has_beats) return "";
     const double first_line = kBeats.top + 9;
     const double second_line = kBeats.top + 25;
     const std::string names =
         text_at(kMargin, first_line, "start", "beats") +
-        text_at(kMargin, second_line, "start", std::to_string(what.bpm) + " BPM");
-    if (too_close(what, data)) {
-        const std::vector<int> heights = stack_heights(what, data);
+        text_at(kMargin, second_line, "start", std::to_string(result.bpm) + " BPM");
+    if (too_close(result, data)) {
+        const std::vector<int> heights = stack_heights(result, data);
         const int most = *std::max_element(heights.begin(), heights.end());
         const double seconds = data.length_ms / 1000.0 * kStackWidth / kPlotColumns;
         return stroke("beats", kBeatColour, kStackWidth - 1, stacked_ticks(heights, most)) + names +
@@ -315,7 +316,7 @@ std::string beats(const record &what, const plot_data &data) {
                text_at(kRight + 6, second_line, "start", "in " + decimal(seconds, 1) + " s");
     }
     std::string path;
-    for (const float beat : what.beats_ms) {
+    for (const float beat : result.beats_ms) {
         path += "M" + decimal(x_of(data, static_cast<double>(beat)), 2) + " " +
                 decimal(kBeats.top, 1) + "V" + decimal(kBeats.bottom, 1);
     }
@@ -324,8 +325,8 @@ std::string beats(const record &what, const plot_data &data) {
 
 }  // namespace
 
-std::string plot_svg(const record &what, const plot_data &data) {
-    return head(what, data) + region(what, data) + time_axis(data) + waveform(data) +
-           loudness(data, what.has_beats ? kLoudness : kLoudnessAlone) + beats(what, data) +
-           highlight(what, data) + "</svg>\n";
+std::string plot_svg(const record &result, const plot_data &data) {
+    return head(result, data) + region(result, data) + time_axis(data) + waveform(data) +
+           loudness(data, result.has_beats ? kLoudness : kLoudnessAlone) + beats(result, data) +
+           highlight(result, data) + "</svg>\n";
 }

@@ -20,7 +20,7 @@ std::string xml(const std::string &bytes) {
     const std::string text = as_utf8(bytes);
     std::string out;
     for (size_t i = 0; i < text.size(); ++i) {
-        const unsigned char c = static_cast<unsigned char>(text[i]);
+        const auto c = static_cast<unsigned char>(text[i]);
         const bool none =
             text.compare(i, 3, "\xEF\xBF\xBE") == 0 || text.compare(i, 3, "\xEF\xBF\xBF") == 0;
         if (c < 0x20 || none) {

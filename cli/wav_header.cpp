@@ -4,13 +4,13 @@
 #include <cstdint>
 #include <cstdio>
 
+#include "common/limits.h"
+
 namespace {
 
 constexpr uint32_t kTagPcm = 1;
 constexpr uint32_t kTagFloat = 3;
 constexpr uint32_t kTagExtensible = 0xFFFE;
-constexpr uint32_t kHighestRate = 48000;  // Hz
-constexpr const char *kSupported = " Only 16-bit integer PCM at up to 48000 Hz is read from WAV.";
 
 // The head of a recognised file: "fmt " is its first chunk, at byte 12.
 struct wav_head {
@@ -23,6 +23,11 @@ struct wav_head {
         return value;
     }
 };
+
+std::string refused(const std::string &reason) {
+    return reason + " Only 16-bit integer PCM at up to " + std::to_string(kMaxRate) +
+           " Hz is read from WAV; ffmpeg -i FILE -c:a pcm_s16le -ar 44100 NEW.wav converts it.";
+}
 
 }  // namespace
 
@@ -41,18 +46,15 @@ std::string explain_wav(const std::string &path) {
     const uint32_t rate = head.number(24, 4);
     const uint32_t channels = head.number(22, 2);
     if (tag == kTagFloat) {
-        return "The WAV file has " + std::to_string(bits) + "-bit floating-point samples." +
-               kSupported;
+        return refused("The WAV file has " + std::to_string(bits) + "-bit floating-point samples.");
     }
     if (tag != kTagPcm) {
-        return "The WAV file has compressed samples (format tag " + std::to_string(tag) + ")." +
-               kSupported;
+        return refused("The WAV file has compressed samples (format tag " + std::to_string(tag) +
+                       ").");
     }
-    if (bits != 16) {
-        return "The WAV file has " + std::to_string(bits) + "-bit samples." + kSupported;
-    }
-    if (rate > kHighestRate) {
-        return "The WAV file's sample rate is " + std::to_string(rate) + " Hz." + kSupported;
+    if (bits != 16) return refused("The WAV file has " + std::to_string(bits) + "-bit samples.");
+    if (rate > static_cast<uint32_t>(kMaxRate)) {
+        return refused("The WAV file's sample rate is " + std::to_string(rate) + " Hz.");
     }
     if (channels == 0) return "The WAV file's header claims 0 channels.";
     return "The WAV file's header or its data is damaged.";

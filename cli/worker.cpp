@@ -13,46 +13,46 @@
 
 namespace {
 
-std::string write_track(record &what, const options &how, const std::string &target) {
+std::string write_track(record &result, const options &opts, const std::string &target) {
     output_file file;
     std::string error = begin_output(file, target);
-    if (error.empty()) error = write_output(file, label_track(what));
-    if (error.empty()) error = commit_output(file, how.force);
+    if (error.empty()) error = write_output(file, label_track(result));
+    if (error.empty()) error = commit_output(file, opts.force);
     abandon_output(file);
-    if (error.empty()) what.written = target;
+    if (error.empty()) result.written = target;
     return error;
 }
 
 // The analysis and its picture, when one is wanted. A target that cannot be written is found out
 // before the work is done.
-record analyse_and_draw(const std::string &path, const options &how, int stop_fd) {
-    if (how.plot.empty()) return analyse(path, how, stop_fd);
-    const std::string error = check_plot(how.plot, path, how.force);
-    if (!error.empty()) return failed_record(path, how.mode, error);
-    record out = analyse(path, how, stop_fd);
-    if (out.status == outcome::ok) draw_plot(out, how, stop_fd);
+record analyse_and_draw(const std::string &path, const options &opts, int stop_fd) {
+    if (opts.plot.empty()) return analyse(path, opts, stop_fd);
+    const std::string error = check_plot(opts.plot, path, opts.force);
+    if (!error.empty()) return failed_record(path, opts.mode, error);
+    record out = analyse(path, opts, stop_fd);
+    if (out.status == outcome::ok) draw_plot(out, opts, stop_fd);
     return out;
 }
 
 // As above, and the file that the format makes of its own.
-record analyse_and_write(const std::string &path, const options &how, int stop_fd) {
-    if (how.format != result_format::labels) return analyse_and_draw(path, how, stop_fd);
-    const std::string target = label_path(path, how.output_dir);
-    std::string error = check_target(target, how.force);
-    if (!error.empty()) return failed_record(path, how.mode, error);
-    record out = analyse_and_draw(path, how, stop_fd);
+record analyse_and_write(const std::string &path, const options &opts, int stop_fd) {
+    if (opts.format != result_format::labels) return analyse_and_draw(path, opts, stop_fd);
+    const std::string target = label_path(path, opts.output_dir);
+    std::string error = check_target(target, opts.force);
+    if (!error.empty()) return failed_record(path, opts.mode, error);
+    record out = analyse_and_draw(path, opts, stop_fd);
     if (out.status != outcome::ok) return out;
-    error = write_track(out, how, target);
+    error = write_track(out, opts, target);
     if (error.empty()) return out;
-    return failed_record(path, how.mode, error);
+    return failed_record(path, opts.mode, error);
 }
 
-reply answer(const input &asked, const options &how, int stop_fd) {
+reply answer(const input &asked, const options &opts, int stop_fd) {
     try {
         if (!asked.error.empty()) {
-            return make_reply(failed_record(asked.path, how.mode, asked.error), how);
+            return make_reply(failed_record(asked.path, opts.mode, asked.error), opts);
         }
-        return make_reply(analyse_and_write(asked.path, how, stop_fd), how);
+        return make_reply(analyse_and_write(asked.path, opts, stop_fd), opts);
     } catch (const std::exception &) {  // the strings' memory is all that can fail here
         reply out;
         out.message = "tavo: there is not enough memory for the result of a file.\n";
@@ -70,12 +70,12 @@ bool read_request(int fd, uint32_t &index) {
 
 }  // namespace
 
-reply make_reply(const record &what, const options &how) {
+reply make_reply(const record &result, const options &opts) {
     reply out;
-    out.status = what.status;
-    out.result = format_record(how.format, what);
-    if (what.status == outcome::failed) {
-        out.message = "tavo: " + shown(what.file) + ": " + what.error + "\n";
+    out.status = result.status;
+    out.result = format_record(opts.format, result);
+    if (result.status == outcome::failed) {
+        out.message = "tavo: " + shown(result.file) + ": " + result.error + "\n";
     }
     return out;
 }
@@ -89,11 +89,11 @@ int write_all(int fd, const char *data, size_t size) {
     return 0;
 }
 
-int serve_requests(int request_fd, int reply_fd, const options &how,
+int serve_requests(int request_fd, int reply_fd, const options &opts,
                    const std::vector<input> &inputs) {
     uint32_t index = 0;
     while (read_request(request_fd, index) && index < inputs.size()) {
-        const reply made = answer(inputs[index], how, request_fd);
+        const reply made = answer(inputs[index], opts, request_fd);
         const reply_head head = {index, static_cast<int32_t>(made.status),
                                  static_cast<uint32_t>(made.result.size()),
                                  static_cast<uint32_t>(made.message.size())};

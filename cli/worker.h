@@ -28,10 +28,10 @@ struct reply {
     std::string message;  // for standard error
 };
 
-reply make_reply(const record &what, const options &how);
+reply make_reply(const record &result, const options &opts);
 
 // Serves requests until their pipe ends. Returns the process's exit status.
-int serve_requests(int request_fd, int reply_fd, const options &how,
+int serve_requests(int request_fd, int reply_fd, const options &opts,
                    const std::vector<input> &inputs);
 
 // Writes all of it, going on after interruptions. Returns 0 or errno.

@@ -9,9 +9,9 @@
 #include <cstring>
 #include <optional>
 
-#include "cli/explain.h"
 #include "cli/ordered_output.h"
 #include "cli/stop.h"
+#include "cli/words.h"
 #include "cli/worker.h"
 
 namespace {
@@ -24,8 +24,8 @@ struct process {
     std::string received;           // of the reply under way
 };
 
-struct pool {
-    const options &how;
+struct worker_pool {
+    const options &opts;
     const std::vector<input> &inputs;
     ordered_output output;
     std::vector<process> processes;
@@ -40,18 +40,18 @@ void close_fd(int &fd) {
 }
 
 // In the new process. Other workers' pipes must not stay open here: their ends are signals.
-[[noreturn]] void become_worker(pool &run, int request_fd, int reply_fd) {
-    for (process &other : run.processes) {
+[[noreturn]] void become_worker(worker_pool &pool, int request_fd, int reply_fd) {
+    for (process &other : pool.processes) {
         close_fd(other.request_fd);
         close_fd(other.reply_fd);
     }
     ignore_stop_signals();
-    const int status = serve_requests(request_fd, reply_fd, run.how, run.inputs);
+    const int status = serve_requests(request_fd, reply_fd, pool.opts, pool.inputs);
     exit(status);
 }
 
 // Returns 0 or errno.
-int start_process(pool &run) {
+int start_process(worker_pool &pool) {
     int request[2] = {-1, -1};
     int answer[2] = {-1, -1};
     int code = pipe(request) == 0 && pipe(answer) == 0 ? 0 : errno;
@@ -60,7 +60,7 @@ int start_process(pool &run) {
     if (pid == 0) {
         close(request[1]);
         close(answer[0]);
-        become_worker(run, request[0], answer[1]);
+        become_worker(pool, request[0], answer[1]);
     }
     close_fd(request[0]);
     close_fd(answer[1]);
@@ -73,49 +73,49 @@ int start_process(pool &run) {
     made.pid = pid;
     made.request_fd = request[1];
     made.reply_fd = answer[0];
-    run.processes.push_back(std::move(made));
+    pool.processes.push_back(std::move(made));
     return 0;
 }
 
-void fail_input(pool &run, uint32_t index, const std::string &error) {
-    const record what = failed_record(run.inputs[index].path, run.how.mode, error);
-    accept_reply(run.output, index, make_reply(what, run.how));
+void fail_input(worker_pool &pool, uint32_t index, const std::string &error) {
+    const record result = failed_record(pool.inputs[index].path, pool.opts.mode, error);
+    accept_reply(pool.output, index, make_reply(result, pool.opts));
 }
 
-process *find_idle(pool &run) {
-    for (process &worker : run.processes) {
+process *find_idle(worker_pool &pool) {
+    for (process &worker : pool.processes) {
         if (worker.request_fd >= 0 && !worker.asked) return &worker;
     }
     return nullptr;
 }
 
 // Gives every idle worker an input, starting workers up to the number asked for.
-void hand_out(pool &run) {
-    while (!run.ending && run.next < run.inputs.size()) {
-        process *worker = find_idle(run);
-        if (worker == nullptr && run.processes.size() < static_cast<size_t>(run.how.jobs)) {
-            const int code = start_process(run);
-            worker = code == 0 ? &run.processes.back() : nullptr;
-            if (code != 0 && run.processes.empty()) {
-                fail_input(run, static_cast<uint32_t>(run.next++),
+void hand_out(worker_pool &pool) {
+    while (!pool.ending && pool.next < pool.inputs.size()) {
+        process *worker = find_idle(pool);
+        if (worker == nullptr && pool.processes.size() < static_cast<size_t>(pool.opts.jobs)) {
+            const int code = start_process(pool);
+            worker = code == 0 ? &pool.processes.back() : nullptr;
+            if (code != 0 && pool.processes.empty()) {
+                fail_input(pool, static_cast<uint32_t>(pool.next++),
                            system_sentence("The analysis process could not be started", code));
                 continue;
             }
         }
         if (worker == nullptr) return;
-        const uint32_t index = static_cast<uint32_t>(run.next++);
+        const auto index = static_cast<uint32_t>(pool.next++);
         worker->asked = index;
         // A worker that died meanwhile shows at its reply pipe's end.
         write_all(worker->request_fd, reinterpret_cast<const char *>(&index), sizeof(index));
     }
 }
 
-void tell_to_end(pool &run) {
-    run.ending = true;
-    for (process &worker : run.processes) close_fd(worker.request_fd);
+void tell_to_end(worker_pool &pool) {
+    pool.ending = true;
+    for (process &worker : pool.processes) close_fd(worker.request_fd);
 }
 
-std::string how_it_ended(int status) {
+std::string ending_text(int status) {
     if (WIFSIGNALED(status)) {
         const int number = WTERMSIG(status);
         return "by signal " + std::to_string(number) + " (" + strsignal(number) + ")";
@@ -124,25 +124,25 @@ std::string how_it_ended(int status) {
 }
 
 // The worker's reply pipe has ended.
-void bury(pool &run, process &worker) {
+void bury(worker_pool &pool, process &worker) {
     close_fd(worker.request_fd);
     close_fd(worker.reply_fd);
     int status = 0;
     while (waitpid(worker.pid, &status, 0) < 0 && errno == EINTR) {
     }
     if (worker.asked) {
-        fail_input(run, *worker.asked,
-                   "The process that analysed this file was ended " + how_it_ended(status) + ".");
+        fail_input(pool, *worker.asked,
+                   "The process that analysed this file was ended " + ending_text(status) + ".");
     } else if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) {
-        run.unclean = true;
-        write_message(run.output, "tavo: an analysis process without a file was ended " +
-                                      how_it_ended(status) + ".\n");
+        pool.unclean = true;
+        write_message(pool.output, "tavo: an analysis process without a file was ended " +
+                                       ending_text(status) + ".\n");
     }
     worker.pid = -1;
 }
 
 // Takes whole replies out of what a worker has sent; there is at most one.
-void take_reply(pool &run, process &worker) {
+void take_reply(worker_pool &pool, process &worker) {
     reply_head head{};
     if (worker.received.size() < sizeof(head)) return;
     memcpy(&head, worker.received.data(), sizeof(head));
@@ -154,58 +154,58 @@ void take_reply(pool &run, process &worker) {
     made.message = worker.received.substr(sizeof(head) + head.result_bytes, head.message_bytes);
     worker.received.erase(0, size);
     worker.asked.reset();
-    accept_reply(run.output, head.index, std::move(made));
+    accept_reply(pool.output, head.index, std::move(made));
 }
 
-void read_from(pool &run, process &worker) {
+void read_from(worker_pool &pool, process &worker) {
     char part[65536];
     const ssize_t got = read(worker.reply_fd, part, sizeof(part));
     if (got > 0) {
         worker.received.append(part, static_cast<size_t>(got));
-        take_reply(run, worker);
+        take_reply(pool, worker);
     } else if (got == 0 || errno != EINTR) {
-        bury(run, worker);
+        bury(pool, worker);
     }
 }
 
 // One wait for whatever comes next: replies, a stop, the reader of the results gone.
-void wait_and_serve(pool &run) {
+void wait_and_serve(worker_pool &pool) {
     std::vector<pollfd> watched;
-    watched.push_back({run.ending ? -1 : stop_fd(), POLLIN, 0});
-    watched.push_back({run.output.to_pipe && !run.ending ? STDOUT_FILENO : -1, 0, 0});
-    for (const process &worker : run.processes) watched.push_back({worker.reply_fd, POLLIN, 0});
-    const int ready = poll(watched.data(), watched.size(), redraw_timeout_ms(run.output));
+    watched.push_back({pool.ending ? -1 : stop_fd(), POLLIN, 0});
+    watched.push_back({pool.output.to_pipe && !pool.ending ? STDOUT_FILENO : -1, 0, 0});
+    for (const process &worker : pool.processes) watched.push_back({worker.reply_fd, POLLIN, 0});
+    const int ready = poll(watched.data(), watched.size(), redraw_timeout_ms(pool.output));
     if (ready > 0) {
-        if ((watched[1].revents & POLLERR) != 0) note_reader_gone(run.output);
-        for (size_t i = 0; i < run.processes.size(); ++i) {
-            if (watched[i + 2].revents != 0) read_from(run, run.processes[i]);
+        if ((watched[1].revents & POLLERR) != 0) note_reader_gone(pool.output);
+        for (size_t i = 0; i < pool.processes.size(); ++i) {
+            if (watched[i + 2].revents != 0) read_from(pool, pool.processes[i]);
         }
         size_t kept = 0;
-        for (process &worker : run.processes) {
+        for (process &worker : pool.processes) {
             if (worker.pid < 0) continue;
-            if (&run.processes[kept] != &worker) run.processes[kept] = std::move(worker);
+            if (&pool.processes[kept] != &worker) pool.processes[kept] = std::move(worker);
             ++kept;
         }
-        run.processes.resize(kept);
+        pool.processes.resize(kept);
     }
-    redraw(run.output);
+    redraw(pool.output);
 }
 
 }  // namespace
 
-int run_workers(const options &how, const std::vector<input> &inputs) {
-    pool run{how, inputs, start_output(how, inputs.size()), {}, 0, false, false};
+int run_workers(const options &opts, const std::vector<input> &inputs) {
+    worker_pool pool{opts, inputs, start_output(opts, inputs.size()), {}, 0, false, false};
     while (true) {
-        const bool stop = stop_requested() || output_failed(run.output);
-        if (!run.ending && (stop || run.next >= inputs.size())) {
+        const bool stop = stop_requested() || output_failed(pool.output);
+        if (!pool.ending && (stop || pool.next >= inputs.size())) {
             // Only a stop may reach workers that still have a file.
             bool busy = false;
-            for (const process &worker : run.processes) busy = busy || worker.asked;
-            if (stop || !busy) tell_to_end(run);
+            for (const process &worker : pool.processes) busy = busy || worker.asked;
+            if (stop || !busy) tell_to_end(pool);
         }
-        hand_out(run);
-        if (run.processes.empty() && (run.ending || run.next >= inputs.size())) break;
-        wait_and_serve(run);
+        hand_out(pool);
+        if (pool.processes.empty() && (pool.ending || pool.next >= inputs.size())) break;
+        wait_and_serve(pool);
     }
-    return finish_output(run.output, run.unclean);
+    return finish_output(pool.output, pool.unclean);
 }

@@ -10,6 +10,6 @@
 
 // Returns the command's exit status. Single-threaded, so that a fork is safe at any moment; in a
 // worker process it does not return.
-int run_workers(const options &how, const std::vector<input> &inputs);
+int run_workers(const options &opts, const std::vector<input> &inputs);
 
 #endif

@@ -5,8 +5,6 @@
 
 namespace {
 
-constexpr int64_t kWindowSeconds = 6;
-constexpr int64_t kHopSeconds = 2;
 constexpr int kSections = 2;  // parts of the song summed side by side
 constexpr int kOverlap = 3;   // windows that hold each sample
 
@@ -71,14 +69,15 @@ void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *o
 int32_t _calc_power_level(const int16_t *pcm, int64_t sample_count, int32_t rate, TAVO_HL_CTX *hl) {
     hl->power_count = 0;
     if (rate <= 0) return 0;
-    const int64_t last = sample_count - kWindowSeconds * rate;  // the last possible window start
+    const int64_t last =
+        sample_count - kPowerWindowSeconds * rate;  // the last possible window start
     if (last < 0) return 0;
-    const int64_t hop = kHopSeconds * rate;
+    const int64_t hop = kPowerHopSeconds * rate;
     const int64_t count = last / hop + 1;
     if (count > INT32_MAX) return 0;
     float *power = static_cast<float *>(malloc(static_cast<size_t>(count) * sizeof(float)));
     if (power == nullptr) return 0;
-    static_assert(kWindowSeconds == kOverlap * kHopSeconds);
+    static_assert(kPowerWindowSeconds == kOverlap * kPowerHopSeconds);
     overlapping_powers(pcm, hop, count, power);
     hl->power = power;
     hl->power_count = static_cast<int32_t>(count);

@@ -8,6 +8,9 @@
 
 #include "common/tavo_ctx.h"
 
+constexpr int64_t kPowerWindowSeconds = 6;  // of one value
+constexpr int64_t kPowerHopSeconds = 2;     // from one value to the next
+
 extern "C" {
 
 // Fills power and power_count (0 and nothing allocated below 6 s). Returns the count. An envelope

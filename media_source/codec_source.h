@@ -5,6 +5,7 @@
 #ifndef TAVO_MEDIA_SOURCE_CODEC_SOURCE_H
 #define TAVO_MEDIA_SOURCE_CODEC_SOURCE_H
 
+#include "common/limits.h"
 #include "media_source/mtsrc_ctx.h"
 #include "media_source/wexaaudio.h"
 
@@ -12,8 +13,6 @@
 constexpr int32_t kAacFrameBytes = 24'576;
 constexpr int32_t kMpegFrameBytes = 19'200;
 
-constexpr int32_t kMinAacRate = 8'000;   // Hz
-constexpr int32_t kMaxRate = 48'000;     // Hz, of all formats but FLAC
 constexpr int32_t kBitsPerSample = 16;   // of every stream's format
 constexpr int32_t kReducedChannels = 2;  // of AAC and FLAC decoders, which are asked for stereo
 

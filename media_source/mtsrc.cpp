@@ -1,13 +1,13 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "common/limits.h"
 #include "media_source/format_table.h"
 #include "media_source/mtsrc_ctx.h"
 #include "media_source/pcm_queue.h"
 
 namespace {
 
-constexpr size_t kPathBytes = 512;  // with the terminator
 constexpr char kMark[] = "KOVA";
 constexpr int32_t kReadOnly = 0;
 
@@ -83,7 +83,7 @@ mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err) {
     mtsrc_file_callbacks(&io);
     io.path = static_cast<char *>(calloc(1, kPathBytes));
     const size_t length = strnlen(param->path, kPathBytes);
-    if (!io.path || length >= kPathBytes) {
+    if (!io.path || length >= static_cast<size_t>(kPathBytes)) {
         *err = -3;
         free(io.path);
         return nullptr;

@@ -1,11 +1,10 @@
 #include <cstring>
 
+#include "common/limits.h"
 #include "media_source/id3v2.h"
 #include "media_source/mtsrc.h"
 
 namespace {
-
-constexpr int32_t kHeadBytes = 16;
 
 using probe = int32_t (*)(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 

@@ -41,7 +41,7 @@ int32_t create(mtsrc_ctx *src, xaac_info *info) {
     src->frm_buf_size = kAacFrameBytes;
     src->codec = kCodecAac;
     src->format = {info->sample_rate, kReducedChannels, kBitsPerSample, info->duration};
-    return info->sample_rate < kMinAacRate || info->sample_rate > kMaxRate ? -3 : 0;
+    return info->sample_rate < kMinRate || info->sample_rate > kMaxRate ? -3 : 0;
 }
 
 }  // namespace

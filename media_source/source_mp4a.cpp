@@ -75,7 +75,7 @@ int32_t open_aac(mtsrc_ctx *src, const xmp4_track &track, int64_t duration) {
     src->frm_buf_size = kAacFrameBytes;
     src->codec = kCodecAac;
     src->format = {track.sample_rate, kReducedChannels, kBitsPerSample, duration};
-    return track.sample_rate < kMinAacRate || track.sample_rate > kMaxRate ? -3 : 0;
+    return track.sample_rate < kMinRate || track.sample_rate > kMaxRate ? -3 : 0;
 }
 
 int32_t open_mpeg(mtsrc_ctx *src, const xmp4_track &track, int64_t duration) {

@@ -2,6 +2,7 @@
 #include <cstdlib>
 
 #include "common/alloc.h"
+#include "common/limits.h"
 #include "common/worker_group.h"
 #include "pcm/decode.h"
 
@@ -10,8 +11,6 @@ pthread_cond_t *ext_cond_mt = nullptr;
 
 namespace {
 
-constexpr int64_t kRefusedUnits = kUnitsPerSecond;  // streams up to this length are refused
-constexpr int32_t kLowestRate = 8000;               // Hz
 constexpr int64_t kSingleThreadUnits = 50'000'000;  // up to 5 s one thread is enough
 constexpr int32_t kParallelSegments = 4;
 constexpr int64_t kOverlapUnits = 20'000'000;  // decoded beyond a segment's share, for the seam
@@ -35,7 +34,7 @@ int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     mtsrc_deinit(probe);
 
     int64_t bytes = 0;
-    if (result != 0 || format.duration <= kRefusedUnits || format.sample_rate < kLowestRate ||
+    if (result != 0 || format.duration <= kRefusedUnits || format.sample_rate < kMinRate ||
         !span_bytes(format.duration, format.sample_rate, &bytes)) {
         return TAVO_ERR_FORMAT;
     }

@@ -9,9 +9,7 @@ cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 bash scripts/setup.sh
 
 echo "== formatting"
-sources=$(git ls-files '*.cpp' '*.h' '*.c' 2>/dev/null) || sources=""
-[[ -n $sources ]] || sources=$(find . -path ./build -prune -o -name '*.cpp' -print -o -name '*.[ch]' -print)
-xargs -d '\n' clang-format --dry-run --Werror <<<"$sources"
+bash scripts/format.sh --check
 
 failed=() # steps, and the tests in them
 for preset in release asan tsan; do

@@ -18,13 +18,15 @@ ALLOWED = {
     "beat": {"common", "dsp"},
     "core": {"common", "dsp", "media_source", "pcm", "highlight", "beat"},
     "jni": {"core"},
-    "cli": {"core"},
+    "java": {"core"},
+    "python": {"core"},
+    "cli": {"common", "core"},
     "desktop": set(),
 }
 PUBLIC = {"core/tavo.h"}  # from everywhere
 # Single headers that a folder may take from one it may not include otherwise.
 SINGLE = {
-    "cli": {"common/tavo_ctx.h", "media_source/mtsrc.h", "highlight/power_envelope.h"},
+    "cli": {"media_source/mtsrc.h", "highlight/power_envelope.h"},
     # The stand-in takes the codec library's interface and nothing else.
     "desktop": {"android/log.h", "media_source/wexaaudio.h", "media_source/mtsrc_io.h"},
 }

@@ -42,6 +42,8 @@ class Includes(unittest.TestCase):
             ("beat/a.cpp", "highlight/b.h", 1),
             ("core/a.cpp", "beat/b.h", 0),
             ("core/a.cpp", "jni/b.h", 1),
+            ("cli/a.cpp", "common/limits.h", 0),
+            ("java/a.cpp", "beat/b.h", 1),
             ("cli/a.cpp", "media_source/mtsrc.h", 0),
             ("cli/a.cpp", "media_source/mtsrc_ctx.h", 1),
             ("cli/a.cpp", "highlight/power_envelope.h", 0),

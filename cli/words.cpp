@@ -1,0 +1,67 @@
+#include "cli/words.h"
+
+#include <array>
+#include <cctype>
+#include <charconv>
+#include <cmath>
+#include <cstdio>
+#include <system_error>
+
+#include "core/tavo.h"
+
+const char *mode_word(int32_t mode) {
+    switch (mode) {
+        case TAVO_MODE_HIGHLIGHT:
+            return "highlight";
+        case TAVO_MODE_BEATS:
+            return "beats";
+        default:
+            return "both";
+    }
+}
+
+const char *status_word(outcome status) {
+    switch (status) {
+        case outcome::ok:
+            return "ok";
+        case outcome::failed:
+            return "failed";
+        case outcome::stopped:
+            return "stopped";
+    }
+    return "failed";
+}
+
+std::string clock_text(double ms) {
+    const long long tenths = std::llround(ms / 100.0);
+    const long long whole = tenths / 10;
+    std::array<char, 48> text{};
+    if (whole >= 3600) {
+        snprintf(text.data(), text.size(), "%lld:%02lld:%02lld.%lld", whole / 3600, whole / 60 % 60,
+                 whole % 60, tenths % 10);
+    } else {
+        snprintf(text.data(), text.size(), "%lld:%02lld.%lld", whole / 60, whole % 60, tenths % 10);
+    }
+    return text.data();
+}
+
+std::string number_text(float value) {
+    std::array<char, 64> text{};
+    const auto end =
+        std::to_chars(text.data(), text.data() + text.size(), value, std::chars_format::fixed);
+    return std::string(text.data(), end.ptr);
+}
+
+std::string count_text(size_t count, const char *noun) {
+    return std::to_string(count) + " " + noun + (count == 1 ? "" : "s");
+}
+
+std::string system_sentence(const std::string &subject, int code) {
+    std::string reason = std::generic_category().message(code);
+    // A capital is lowered, unless the word is an acronym.
+    if (reason.size() > 1 && isupper(static_cast<unsigned char>(reason[0])) != 0 &&
+        islower(static_cast<unsigned char>(reason[1])) != 0) {
+        reason[0] = static_cast<char>(tolower(static_cast<unsigned char>(reason[0])));
+    }
+    return subject + ": " + reason + ".";
+}

@@ -1,0 +1,26 @@
+// Words and sentences that several parts of the command use.
+#ifndef TAVO_CLI_WORDS_H
+#define TAVO_CLI_WORDS_H
+
+#include <cstdint>
+#include <string>
+
+#include "cli/record.h"
+
+// Words of the interface: highlight, beats, both; ok, failed, stopped.
+const char *mode_word(int32_t mode);
+const char *status_word(outcome status);
+
+// m:ss.t, or h:mm:ss.t from an hour on.
+std::string clock_text(double ms);
+
+// The shortest decimal that gives the same float again.
+std::string number_text(float value);
+
+// "1 file", "2 files".
+std::string count_text(size_t count, const char *noun);
+
+// "subject: reason of the system." from an errno value.
+std::string system_sentence(const std::string &subject, int code);
+
+#endif

@@ -1,0 +1,12 @@
+#!/usr/bin/env bash
+# scripts/format.sh [--check]
+# Lays out all C and C++ sources by .clang-format; with --check only says where that would change one.
+set -euo pipefail
+cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
+case ${1:-} in
+  "") options=(-i) ;;
+  --check) options=(--dry-run --Werror) ;;
+  *) echo "usage: format.sh [--check]" >&2; exit 2 ;;
+esac
+{ git ls-files --cached --others --exclude-standard 2>/dev/null || find . -path ./build -prune -o -type f -print; } |
+  grep -E '\.(cpp|h|c)$' | xargs -d '\n' clang-format "${options[@]}"
