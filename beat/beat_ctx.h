@@ -4,12 +4,13 @@
 #ifndef TAVO_BEAT_BEAT_CTX_H
 #define TAVO_BEAT_BEAT_CTX_H
 
+#include <pthread.h>
+
+#include <cstddef>
 #include <cstdint>
-#include <cstdlib>
 
 #include "common/alloc.h"
 #include "common/tavo_ctx.h"
-#include "dsp/fft.h"
 
 constexpr int32_t kMelBands = 36;
 constexpr int32_t kBeatWorkers = 4;
@@ -30,50 +31,8 @@ struct TAVO_BEAT_CTX {
     int32_t band_count;   // 36
 };
 
-// One of the four threads of the onset envelope; it writes the rows of its own frames only.
-struct TAVO_ONSET_WORKER {
-    int32_t id;  // 0 to 3, also its slot in done_flags
-    pthread_t thread;
-    const double *signal;     // [n]
-    int64_t first;            // frame
-    int64_t last;             // frame, included
-    float **spectrum;         // [F] rows of [N / 2], shared
-    int32_t frame_size;       // N
-    int32_t hop_size;         // H
-    int64_t first_sample;     // first * H
-    const TAVO_FFT_CTX *fft;  // of size N, shared, read-only
-    int32_t *done_flags;      // [thread_count] shared
-    int32_t thread_count;     // 4
-    pthread_mutex_t *mutex;   // feat_mutex_mt
-    pthread_cond_t *cond;     // feat_cond_mt
-    int32_t band_count;       // 36
-    float **mel_matrix;       // shared, read-only
-    double **mel;             // [F] rows of [36] decibels, shared
-    const double *window;     // [N] shared, read-only
-};
-
-// One of the four threads of the threshold curve; it writes thr[first .. last] only.
-struct TAVO_THRES_WORKER {
-    int32_t id;  // 0 to 3, also its slot in done_flags
-    pthread_t thread;
-    double *thr;              // [F - 1] shared
-    const double *onset_env;  // [F] read-only
-    int64_t first;            // index
-    int64_t last;             // index, included
-    int32_t window;           // W, frames
-    int32_t percentile;       // 97
-    double running_max;       // largest threshold produced, 0 at start
-    int32_t *done_flags;      // [thread_count] shared
-    int32_t thread_count;     // 4
-    pthread_mutex_t *mutex;   // feat_mutex_mt
-    pthread_cond_t *cond;     // feat_cond_mt
-};
-
 static_assert(offsetof(TAVO_BEAT_CTX, rise_flags) == 56 &&
               offsetof(TAVO_BEAT_CTX, band_count) == 88);
-static_assert(offsetof(TAVO_ONSET_WORKER, fft) == 64 && offsetof(TAVO_ONSET_WORKER, window) == 128);
-static_assert(offsetof(TAVO_THRES_WORKER, running_max) == 56);
-static_assert(offsetof(TAVO_THRES_WORKER, cond) == 88);
 
 extern "C" {
 

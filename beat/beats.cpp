@@ -25,8 +25,12 @@ outcome find_rises(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     return code == 0 ? going_on : out_of_memory;
 }
 
-outcome find_tempo(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
+outcome take_onsets(const TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
     _getOnsetEnvelope(beat, onset->frame_size, onset->hop_size);
+    return going_on;
+}
+
+outcome find_tempo(TAVO_ONSET_CTX *onset, const TAVO_BEAT_CTX *beat) {
     const int32_t bpm = estimate_tempo(beat);
     if (bpm < 0) return out_of_memory;
     onset->bpm = bpm;
@@ -55,6 +59,7 @@ outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
 outcome analyse(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     outcome end = find_rises(ctx, beat);
     if (end == going_on) end = stop_asked(ctx);
+    if (end == going_on) end = take_onsets(ctx->onset, beat);
     if (end == going_on) end = find_tempo(ctx->onset, beat);
     if (end == going_on) end = stop_asked(ctx);
     if (end == going_on) end = find_beats(ctx->onset, beat);

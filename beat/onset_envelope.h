@@ -6,6 +6,30 @@
 #define TAVO_BEAT_ONSET_ENVELOPE_H
 
 #include "beat/beat_ctx.h"
+#include "dsp/fft.h"
+
+// One of the four threads of the onset envelope; it writes the rows of its own frames only.
+struct TAVO_ONSET_WORKER {
+    int32_t id;  // 0 to 3, also its slot in done_flags
+    pthread_t thread;
+    const double *signal;     // [n]
+    int64_t first;            // frame
+    int64_t last;             // frame, included
+    float **spectrum;         // [F] rows of [N / 2], shared
+    int32_t frame_size;       // N
+    int32_t hop_size;         // H
+    int64_t first_sample;     // first * H
+    const TAVO_FFT_CTX *fft;  // of size N, shared, read-only
+    int32_t *done_flags;      // [thread_count] shared
+    int32_t thread_count;     // 4
+    pthread_mutex_t *mutex;   // feat_mutex_mt
+    pthread_cond_t *cond;     // feat_cond_mt
+    int32_t band_count;       // 36
+    float **mel_matrix;       // shared, read-only
+    double **mel;             // [F] rows of [36] decibels, shared
+    const double *window;     // [N] shared, read-only
+};
+static_assert(offsetof(TAVO_ONSET_WORKER, fft) == 64 && offsetof(TAVO_ONSET_WORKER, window) == 128);
 
 extern "C" {
 

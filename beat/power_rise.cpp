@@ -17,7 +17,6 @@ constexpr int64_t kLookAhead = 8;      // blocks in the four-second mean
 constexpr int64_t kRiseApart = 7;      // blocks from a rise to the next possible one
 constexpr double kMeanStep = 4.0;      // dB the quiet blocks lie below the mean to come
 constexpr double kLoudMargin = 3.0;    // dB that the loud part may miss P60 by
-constexpr int32_t kNoMemory = -2;
 
 struct block_levels {
     double *db;      // [count + kLookAhead] loudest level of each block, the rest kUnmeasured
@@ -145,7 +144,7 @@ int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n) {
     block_levels blocks = {zeroed_items<double>(count + kLookAhead), zeroed_items<int32_t>(count),
                            count};
     double *sorted = zeroed_items<double>(count);
-    int32_t rises = kNoMemory;
+    int32_t rises = TAVO_ERR_MEMORY;
     if (blocks.db != nullptr && blocks.entry != nullptr && sorted != nullptr) {
         for (int64_t b = 0; b < count + kLookAhead; ++b) blocks.db[b] = kUnmeasured;
         measure_blocks(signal, n, &blocks);
@@ -161,7 +160,7 @@ int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n) {
 int32_t collect_rise_frames(TAVO_BEAT_CTX *beat, int64_t n, int32_t hop_size, int32_t count) {
     if (count < 1 || hop_size < 1) return 0;
     beat->rise_frames = zeroed_items<int32_t>(count);
-    if (beat->rise_frames == nullptr) return kNoMemory;
+    if (beat->rise_frames == nullptr) return TAVO_ERR_MEMORY;
     for (int64_t s = 0; s < n && beat->rise_count < count; ++s) {
         if (beat->rise_flags[s] != 0) {
             beat->rise_frames[beat->rise_count] = static_cast<int32_t>(s / hop_size);

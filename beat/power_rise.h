@@ -1,4 +1,5 @@
-// Stage 5: the places where the music becomes loud after at least a second of relative quiet.
+// Stage 4, before the onset envelope: the places where the music becomes loud after at least a
+// second of relative quiet.
 // In: TAVO_BEAT_CTX.signal. Out: rise_flags, rise_frames, rise_count. After: beat/candidates.h.
 #ifndef TAVO_BEAT_POWER_RISE_H
 #define TAVO_BEAT_POWER_RISE_H

@@ -2,6 +2,8 @@
 
 #include <cmath>
 
+#include "dsp/fft.h"
+
 namespace {
 
 constexpr double kExcerptEnd = 120.0;           // seconds from the start of the signal, at most
@@ -12,7 +14,6 @@ constexpr double kOctave = 0.6931471805599453;  // ln 2: the prior is one octave
 constexpr double kFasterWins = 0.53;  // share of the shorter period above which it is taken
 constexpr int32_t kFastestBpm = 200;  // an estimate above is not believed
 constexpr int32_t kDefaultBpm = 90;
-constexpr int32_t kNoMemory = -2;
 
 struct period_candidate {
     double score;
@@ -64,11 +65,11 @@ void weigh_lags(double *r, int32_t lags, double hop) {
 // Circular autocorrelation of the excerpt already in re[nfft]: re[t] for t < lags. Lags from nfft
 // on repeat, as those of a circular correlation do.
 int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32_t lags) {
-    if (tavo_dft(re, im, nfft, count, 1) != 0) return kNoMemory;
+    if (tavo_dft(re, im, nfft, count, 1) != 0) return TAVO_ERR_MEMORY;
     for (int64_t k = 0; k < nfft; ++k) re[k] = re[k] * re[k] + im[k] * im[k];
 
     const int64_t distinct = lags < nfft ? lags : nfft;
-    if (tavo_inverse_dft(re, im, nfft, distinct, 1) != 0) return kNoMemory;
+    if (tavo_inverse_dft(re, im, nfft, distinct, 1) != 0) return TAVO_ERR_MEMORY;
     for (int64_t t = nfft; t < lags; ++t) re[t] = re[t - nfft];
     return 0;
 }
@@ -81,8 +82,7 @@ int64_t transform_size(int64_t count) {
 }
 
 // The period as the excerpt x[count] gives it; 0 for none; -2 out of memory.
-// One value that is no number, as all are in silence, leaves no correlation that is: the sums of
-// the transforms, millions of terms then, are not worth taking.
+// A single NaN (silence gives nothing else) makes every correlation NaN, so skip the transforms.
 int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, double hop) {
     for (int32_t i = 0; i < count; ++i) {
         if (!std::isfinite(x[i])) return 0;
@@ -90,7 +90,7 @@ int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, 
     const int64_t room = nfft > lags ? nfft : lags;
     double *re = zeroed_items<double>(room);
     double *im = zeroed_items<double>(room);
-    int32_t period = kNoMemory;
+    int32_t period = TAVO_ERR_MEMORY;
     if (re != nullptr && im != nullptr) {
         for (int32_t i = 0; i < count; ++i) re[i] = x[i];
         if (autocorrelate(re, im, nfft, count, lags) == 0) {
@@ -109,7 +109,7 @@ int32_t calc_bpm_acf(const double *x, int64_t nfft, int32_t D, int32_t L, double
     if (nfft < 1) return kNoPeriodBpm;
     const int32_t count = L < nfft ? L : static_cast<int32_t>(nfft);
     const int32_t period = find_period(x, nfft, D, count, hop);
-    if (period < 0) return kNoMemory;
+    if (period < 0) return TAVO_ERR_MEMORY;
     if (period == 0) return kNoPeriodBpm;  // 60 / 0 has no place in an integer
     const double bpm = kMinute / (period * hop);
     return bpm < kNoPeriodBpm ? static_cast<int32_t>(bpm) : kNoPeriodBpm;

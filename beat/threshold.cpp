@@ -6,7 +6,6 @@
 namespace {
 
 constexpr int32_t kPercentile = 97;
-constexpr int32_t kNoMemory = -2;
 
 int32_t percentile_index(int32_t count, int32_t percentile) {
     return static_cast<int32_t>(int64_t{count} * percentile / 100);
@@ -113,7 +112,7 @@ int32_t run_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr, doub
     worker_group_run(slots, kBeatWorkers, feat_mutex_mt, feat_cond_mt, done);
 
     for (const TAVO_THRES_WORKER &worker : workers) {
-        if (worker.thr == nullptr) return kNoMemory;
+        if (worker.thr == nullptr) return TAVO_ERR_MEMORY;
         if (worker.running_max > *top) *top = worker.running_max;
     }
     return 0;
@@ -159,10 +158,10 @@ int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, double *thr) 
     const int64_t frames = beat->frame_count;
     const int64_t half = window / 2;
     if (frames < 2 || window < 2) return 0;
-    if (feat_mutex_mt == nullptr || feat_cond_mt == nullptr) return kNoMemory;
+    if (feat_mutex_mt == nullptr || feat_cond_mt == nullptr) return TAVO_ERR_MEMORY;
     const auto second = static_cast<int32_t>(1.0f / beat->frame_times[0]);
     double *scratch = zeroed_items<double>(window > second ? window : second);
-    if (scratch == nullptr) return kNoMemory;
+    if (scratch == nullptr) return TAVO_ERR_MEMORY;
 
     // One or two values short of a full window, the single place in the middle has what there is.
     // frames counts the envelope's last entry, which is always 0.

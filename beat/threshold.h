@@ -5,6 +5,25 @@
 
 #include "beat/beat_ctx.h"
 
+// One of the four threads of the threshold curve; it writes thr[first .. last] only.
+struct TAVO_THRES_WORKER {
+    int32_t id;  // 0 to 3, also its slot in done_flags
+    pthread_t thread;
+    double *thr;              // [F - 1] shared
+    const double *onset_env;  // [F] read-only
+    int64_t first;            // index
+    int64_t last;             // index, included
+    int32_t window;           // W, frames
+    int32_t percentile;       // 97
+    double running_max;       // largest threshold produced, 0 at start
+    int32_t *done_flags;      // [thread_count] shared
+    int32_t thread_count;     // 4
+    pthread_mutex_t *mutex;   // feat_mutex_mt
+    pthread_cond_t *cond;     // feat_cond_mt
+};
+static_assert(offsetof(TAVO_THRES_WORKER, running_max) == 56);
+static_assert(offsetof(TAVO_THRES_WORKER, cond) == 88);
+
 extern "C" {
 
 // Thread entry of one worker, and its completion handler. The argument is the TAVO_THRES_WORKER.

@@ -2,6 +2,7 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "core/tavo.h"
 #include "dsp/fft.h"
 
 namespace {
@@ -9,24 +10,23 @@ namespace {
 constexpr double kTwoPi = 6.283185307179586;
 constexpr int64_t kMaxFftSize = 16384;
 constexpr int64_t kMaxCopy = INT64_MAX / 32;  // values; two copies in bytes stay countable
-constexpr int32_t kOutOfMemory = -2;
 
 // Two arrays of doubles in one allocation.
-struct COMPLEX_COPY {
+struct complex_copy {
     double *re;
     double *im;
 };
 
 // Room for 2 count doubles. The first used values of re, and of im unless it is null, are copied;
 // the rest is zero.
-bool copy_input(COMPLEX_COPY *copy, const double *re, const double *im, int64_t used,
+bool copy_input(complex_copy *copy, const double *re, const double *im, int64_t used,
                 int64_t count) {
     if (count > kMaxCopy) return false;
-    const size_t room = static_cast<size_t>(count < 1 ? 1 : count);
+    const auto room = static_cast<size_t>(count < 1 ? 1 : count);
     copy->re = static_cast<double *>(calloc(room, 2 * sizeof(double)));
     if (copy->re == nullptr) return false;
     copy->im = copy->re + room;
-    const size_t bytes = static_cast<size_t>(used) * sizeof(double);
+    const auto bytes = static_cast<size_t>(used) * sizeof(double);
     if (bytes > 0) memcpy(copy->re, re, bytes);
     if (bytes > 0 && im != nullptr) memcpy(copy->im, im, bytes);
     return true;
@@ -34,16 +34,16 @@ bool copy_input(COMPLEX_COPY *copy, const double *re, const double *im, int64_t 
 
 // The fast transform spreads one infinite or NaN value over all outputs, where the sums do not
 // everywhere, and its intermediate values must not overflow: such input goes term by term.
-bool suits_fft(const COMPLEX_COPY &x, int64_t used, int64_t n) {
+bool suits_fft(const complex_copy &x, int64_t used, int64_t n) {
     if (n < 2 || n > kMaxFftSize || (n & (n - 1)) != 0) return false;
     double l1_norm = 0.0;
-    for (int64_t i = 0; i < used; i++) l1_norm += fabs(x.re[i]) + fabs(x.im[i]);
+    for (int64_t i = 0; i < used; ++i) l1_norm += fabs(x.re[i]) + fabs(x.im[i]);
     return std::isfinite(2.0 * l1_norm);
 }
 
 bool transform_fast(double *re, double *im, int64_t n) {
     TAVO_FFT_CTX fft;
-    const int16_t size = static_cast<int16_t>(n);
+    const auto size = static_cast<int16_t>(n);
     tavo_fft_init(size, &fft);
     if (fft.cos_table == nullptr) return false;
     tavo_fft_proc(re, im, size, &fft);
@@ -52,13 +52,13 @@ bool transform_fast(double *re, double *im, int64_t n) {
 }
 
 // Terms beyond used are zero and change no sum.
-void forward_sums(double *re, double *im, int64_t n, const COMPLEX_COPY &x, int64_t used,
+void forward_sums(double *re, double *im, int64_t n, const complex_copy &x, int64_t used,
                   bool real_input) {
-    for (int64_t k = 0; k < n; k++) {
+    for (int64_t k = 0; k < n; ++k) {
         double sum_re = 0.0;
         double sum_im = 0.0;
-        for (int64_t i = 0; i < used; i++) {
-            const double theta =
+        for (int64_t i = 0; i < used; ++i) {
+            const auto theta =
                 static_cast<double>(i) * kTwoPi * static_cast<double>(k) / static_cast<double>(n);
             const double c = cos(theta);
             const double s = sin(theta);
@@ -75,13 +75,13 @@ void forward_sums(double *re, double *im, int64_t n, const COMPLEX_COPY &x, int6
     }
 }
 
-void inverse_sums(double *re, double *im, int64_t n, int64_t m, const COMPLEX_COPY &x,
+void inverse_sums(double *re, double *im, int64_t n, int64_t m, const complex_copy &x,
                   bool real_input) {
-    for (int64_t t = 0; t < m; t++) {
+    for (int64_t t = 0; t < m; ++t) {
         double sum_re = 0.0;
         double sum_im = 0.0;
-        for (int64_t i = 0; i < n; i++) {
-            const double theta =
+        for (int64_t i = 0; i < n; ++i) {
+            const auto theta =
                 static_cast<double>(t) * kTwoPi * static_cast<double>(i) / static_cast<double>(n);
             const double c = cos(theta);
             const double s = sin(theta);
@@ -110,10 +110,10 @@ int32_t tavo_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_inpu
     const bool real = real_input != 0;
     const int64_t used = clamp_count(m, n);
     const bool small = n <= kMaxFftSize;  // the fast transform works inside the copy
-    COMPLEX_COPY x;
-    if (!copy_input(&x, re, real ? nullptr : im, used, small ? n : used)) return kOutOfMemory;
+    complex_copy x;
+    if (!copy_input(&x, re, real ? nullptr : im, used, small ? n : used)) return TAVO_ERR_MEMORY;
     if (suits_fft(x, used, n) && transform_fast(x.re, x.im, n)) {
-        const size_t bytes = static_cast<size_t>(n) * sizeof(double);
+        const auto bytes = static_cast<size_t>(n) * sizeof(double);
         memcpy(re, x.re, bytes);
         memcpy(im, x.im, bytes);
     } else {
@@ -127,11 +127,11 @@ int32_t tavo_inverse_dft(double *re, double *im, int64_t n, int64_t m, int32_t r
     const int64_t outputs = clamp_count(m, n);
     if (n <= 0 || outputs == 0) return 0;
     const bool real = real_input != 0;
-    COMPLEX_COPY x;
-    if (!copy_input(&x, re, real ? nullptr : im, n, n)) return kOutOfMemory;
+    complex_copy x;
+    if (!copy_input(&x, re, real ? nullptr : im, n, n)) return TAVO_ERR_MEMORY;
     // Real and imaginary part exchanged, before and after, turn the forward into the inverse.
     if (suits_fft(x, n, n) && transform_fast(x.im, x.re, n)) {
-        for (int64_t t = 0; t < outputs; t++) {
+        for (int64_t t = 0; t < outputs; ++t) {
             re[t] = x.re[t] / static_cast<double>(n);
             im[t] = x.im[t] / static_cast<double>(n);
         }

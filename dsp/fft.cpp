@@ -2,7 +2,8 @@
 
 #include <cmath>
 #include <cstdlib>
-#include <cstring>
+
+#include "dsp/lanes.h"
 
 namespace {
 
@@ -17,29 +18,29 @@ bool is_fft_size(int32_t n) {
 
 int32_t halvings(int32_t n) {
     int32_t count = 0;
-    for (; n > 1; n /= 2) count++;
+    for (; n > 1; n /= 2) ++count;
     return count;
 }
 
 void fill_twiddles(TAVO_FFT_CTX *ctx, int32_t n) {
-    for (int32_t k = 0; k < n / 2; k++) {
+    for (int32_t k = 0; k < n / 2; ++k) {
         const double angle = k * kTwoPi / n;
         ctx->cos_table[k] = cos(angle);
         ctx->sin_table[k] = -sin(angle);
     }
 }
 
-// Every pair of positions is listed once, at its smaller member.
+// Every double_pair of positions is listed once, at its smaller member.
 void fill_bit_reverse(TAVO_FFT_CTX *ctx, int32_t n) {
-    const uint32_t bits = static_cast<uint32_t>(ctx->stages);
-    for (uint32_t i = 0; i < static_cast<uint32_t>(n); i++) {
+    const auto bits = static_cast<uint32_t>(ctx->stages);
+    for (uint32_t i = 0; i < static_cast<uint32_t>(n); ++i) {
         const uint32_t reversed = bit_reverse2(bits, i);
         ctx->bit_reverse[i] = reversed >= i ? reversed : 0;
     }
 }
 
 void permute(double *re, double *im, int32_t n, const uint32_t *bit_reverse) {
-    for (int32_t i = 0; i < n; i++) {
+    for (int32_t i = 0; i < n; ++i) {
         const uint32_t r = bit_reverse[i];
         if (r == 0) continue;
         const double held_re = re[i];
@@ -67,20 +68,7 @@ void first_stage(double *re, double *im, int32_t n, const TAVO_FFT_CTX *ctx) {
     }
 }
 
-// Two neighbouring elements at a time: the same products and sums as one by one.
-typedef double PAIR __attribute__((vector_size(16)));
-
-PAIR load(const double *from) {
-    PAIR pair;
-    memcpy(&pair, from, sizeof pair);
-    return pair;
-}
-
-void store(double *to, PAIR pair) {
-    memcpy(to, &pair, sizeof pair);
-}
-
-// Groups of span elements, 4 or more.
+// Groups of span elements, 4 or more; two neighbouring elements at a time.
 void later_stage(double *re, double *im, int32_t n, int32_t span, const TAVO_FFT_CTX *ctx) {
     const double *cos_table = ctx->cos_table;
     const double *sin_table = ctx->sin_table;
@@ -91,18 +79,18 @@ void later_stage(double *re, double *im, int32_t n, int32_t span, const TAVO_FFT
             const int32_t top = group + j;
             const int32_t bottom = top + half;
             const int32_t w = j * stride;
-            const PAIR w_re = {cos_table[w], cos_table[w + stride]};
-            const PAIR w_im = {sin_table[w], sin_table[w + stride]};
-            const PAIR x_re = load(re + bottom);
-            const PAIR x_im = load(im + bottom);
-            const PAIR t_re = x_re * w_re - x_im * w_im;
-            const PAIR t_im = x_re * w_im + x_im * w_re;
-            const PAIR top_re = load(re + top);
-            const PAIR top_im = load(im + top);
-            store(re + bottom, top_re - t_re);
-            store(im + bottom, top_im - t_im);
-            store(re + top, top_re + t_re);
-            store(im + top, top_im + t_im);
+            const double_pair w_re = {cos_table[w], cos_table[w + stride]};
+            const double_pair w_im = {sin_table[w], sin_table[w + stride]};
+            const double_pair x_re = load_pair(re + bottom);
+            const double_pair x_im = load_pair(im + bottom);
+            const double_pair t_re = x_re * w_re - x_im * w_im;
+            const double_pair t_im = x_re * w_im + x_im * w_re;
+            const double_pair top_re = load_pair(re + top);
+            const double_pair top_im = load_pair(im + top);
+            store_pair(re + bottom, top_re - t_re);
+            store_pair(im + bottom, top_im - t_im);
+            store_pair(re + top, top_re + t_re);
+            store_pair(im + top, top_im + t_im);
         }
     }
 }
@@ -112,7 +100,7 @@ void later_stage(double *re, double *im, int32_t n, int32_t span, const TAVO_FFT
 void tavo_fft_init(int16_t n, TAVO_FFT_CTX *ctx) {
     *ctx = {};
     if (!is_fft_size(n)) return;
-    const size_t size = static_cast<size_t>(n);
+    const auto size = static_cast<size_t>(n);
     ctx->stages = halvings(n);
     ctx->cos_table = static_cast<double *>(calloc(size, sizeof(double)));
     ctx->sin_table = static_cast<double *>(calloc(size, sizeof(double)));

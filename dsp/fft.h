@@ -1,5 +1,6 @@
 // Fourier transforms of double-precision data in separate real and imaginary arrays. The forward
-// transforms are unscaled, the inverse divides by N.
+// transforms are unscaled, the inverse divides by N. Callers: beat/onset_envelope.h (the FFT of
+// every frame), beat/tempo.h (the direct transforms of one excerpt).
 #ifndef TAVO_DSP_FFT_H
 #define TAVO_DSP_FFT_H
 

@@ -1,4 +1,4 @@
-// Matrix product over row pointers.
+// Matrix product over row pointers. Caller: beat/onset_envelope.h, spectra times mel bands.
 #ifndef TAVO_DSP_MATRIX_H
 #define TAVO_DSP_MATRIX_H
 

@@ -13,13 +13,13 @@ constexpr double kLogStep = 0.06877952768077182;  // above it: ln of the frequen
 
 float Hz2Mel(float hz) {
     if (hz < kBreakHz) return hz / kHzPerMel;
-    const float log_ratio = static_cast<float>(log(static_cast<double>(hz) / 1000.0));
+    const auto log_ratio = static_cast<float>(log(static_cast<double>(hz) / 1000.0));
     return static_cast<float>(static_cast<double>(log_ratio) / kLogStep + 15.0);
 }
 
 float Mel2Hz(float mel) {
     if (mel < kBreakMel) return mel * kHzPerMel;
     const float steps = mel - kBreakMel;
-    const float ratio = static_cast<float>(exp(static_cast<double>(steps) * kLogStep));
+    const auto ratio = static_cast<float>(exp(static_cast<double>(steps) * kLogStep));
     return ratio * kBreakHz;
 }

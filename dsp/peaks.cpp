@@ -22,21 +22,21 @@ bool is_peak(const Sample *x, int64_t i) {
 template <typename Sample>
 int64_t count_peaks(const Sample *x, int64_t len) {
     int64_t count = 0;
-    for (int64_t i = 1; i + 1 < len; i++) count += is_peak(x, i) ? 1 : 0;
+    for (int64_t i = 1; i + 1 < len; ++i) count += is_peak(x, i) ? 1 : 0;
     return count;
 }
 
 // The count peaks of x[len] in ascending order, to be freed; null when memory runs out.
 template <typename Record, typename Sample>
 Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
-    Record *peaks = static_cast<Record *>(calloc(static_cast<size_t>(count), sizeof(Record)));
+    auto *peaks = static_cast<Record *>(calloc(static_cast<size_t>(count), sizeof(Record)));
     if (peaks == nullptr) return nullptr;
     int64_t k = 0;
-    for (int64_t i = 1; i + 1 < len; i++) {
+    for (int64_t i = 1; i + 1 < len; ++i) {
         if (!is_peak(x, i)) continue;
         peaks[k].value = x[i];
         peaks[k].index = static_cast<decltype(peaks[k].index)>(i);
-        k++;
+        ++k;
     }
     return peaks;
 }
@@ -57,7 +57,7 @@ template <typename Record, typename Index>
 int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int64_t len,
                         int64_t reach, int64_t limit, Index *out) {
     int32_t written = 0;
-    for (int64_t k = 0; k < count && written < limit; k++) {
+    for (int64_t k = 0; k < count && written < limit; ++k) {
         const int64_t index = peaks[k].index;
         if ((marks[index] & kSuppressed) != 0) continue;
         out[written++] = peaks[k].index;
@@ -69,12 +69,12 @@ int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int6
 // Suppresses everything at most reach away from a position marked as priority, in two sweeps.
 void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t reach) {
     int64_t distance = kFar;  // to the last priority position seen
-    for (int64_t i = 0; i < len; i++) {
+    for (int64_t i = 0; i < len; ++i) {
         distance = (marks[i] & kPriority) != 0 ? 0 : distance + 1;
         if (distance <= reach) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
     }
     distance = kFar;
-    for (int64_t i = len - 1; i >= 0; i--) {
+    for (int64_t i = len - 1; i >= 0; --i) {
         distance = (marks[i] & kPriority) != 0 ? 0 : distance + 1;
         if (distance <= reach) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
     }
@@ -103,11 +103,11 @@ int32_t nearest_by_halving(const int32_t *list, int32_t target, int32_t n) {
 int32_t take_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *priority,
                         int32_t n_priority, uint8_t *marks, int32_t *out) {
     if (count < 2 || n_priority < 1) return 0;
-    int32_t *list = static_cast<int32_t *>(malloc(static_cast<size_t>(count) * sizeof(int32_t)));
+    auto *list = static_cast<int32_t *>(malloc(static_cast<size_t>(count) * sizeof(int32_t)));
     if (list == nullptr) return -1;
-    for (int32_t k = 0; k < count; k++) list[k] = peaks[k].index;
+    for (int32_t k = 0; k < count; ++k) list[k] = peaks[k].index;
     int32_t taken = 0;
-    for (int32_t k = 0; k < n_priority; k++) {
+    for (int32_t k = 0; k < n_priority; ++k) {
         // Below 0 the walk's distances may wrap, which halving does not follow.
         const int32_t nearest = priority[k] < 0 ? findNearestIndex(list, priority[k], count)
                                                 : nearest_by_halving(list, priority[k], count);
@@ -120,7 +120,7 @@ int32_t take_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *pr
 }
 
 int32_t wrapping_distance(int32_t a, int32_t b) {
-    const uint32_t difference = static_cast<uint32_t>(a) - static_cast<uint32_t>(b);
+    const auto difference = static_cast<uint32_t>(a) - static_cast<uint32_t>(b);
     const bool negative = static_cast<int32_t>(difference) < 0;
     return static_cast<int32_t>(negative ? 0u - difference : difference);
 }
@@ -133,7 +133,7 @@ int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
     PEAK_INFO_F *peaks = collect_peaks<PEAK_INFO_F>(x, len, count);
-    uint8_t *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
     int32_t written = 0;
     if (peaks != nullptr && marks != nullptr) {
         qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO_F), compare_peak_f);
@@ -151,14 +151,14 @@ int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out)
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
     PEAK_INFO *peaks = collect_peaks<PEAK_INFO>(x, len, count);
-    uint8_t *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
     int32_t written = 0;
     if (peaks != nullptr && marks != nullptr) {
         if (min_dist != 0) {
             qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO), compare_peak);
         }
         // Bounds excluded: a peak min_dist away survives.
-        const int64_t reach = static_cast<int64_t>(min_dist) - 1;
+        const auto reach = static_cast<int64_t>(min_dist) - 1;
         written = write_survivors(peaks, count, marks, len, reach, count, out);
     }
     free(marks);
@@ -173,7 +173,7 @@ int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
     PEAK_INFO *peaks = collect_peaks<PEAK_INFO>(x, len, count);
-    uint8_t *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
     int32_t taken = -1;
     if (peaks != nullptr && marks != nullptr) {
         taken =
@@ -181,7 +181,7 @@ int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_
     }
     int32_t written = 0;
     if (taken >= 0) {
-        const int64_t reach = static_cast<int64_t>(min_dist) - 1;
+        const auto reach = static_cast<int64_t>(min_dist) - 1;
         suppress_around_priorities(marks, len, reach);
         qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO), compare_peak);
         written = taken + write_survivors(peaks, count, marks, len, reach, count, out + taken);
@@ -193,14 +193,14 @@ int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_
 
 int32_t findNearestIndex(const int32_t *list, int32_t target, int32_t n) {
     if (n < 2) return 0;
-    for (int32_t k = 0; k + 1 < n; k++) {
+    for (int32_t k = 0; k + 1 < n; ++k) {
         if (wrapping_distance(list[k + 1], target) >= wrapping_distance(list[k], target)) return k;
     }
     return n - 1;
 }
 
 int32_t findIndex(const double *x, int32_t n, double value) {
-    for (int32_t k = 0; k < n; k++) {
+    for (int32_t k = 0; k < n; ++k) {
         if (x[k] == value) return k;
     }
     return 0;

@@ -1,5 +1,6 @@
 // Peak picking over plain arrays. A peak is an index i, neither first nor last, whose value is
-// greater than both neighbours'. The caller owns every array.
+// greater than both neighbours'. The caller owns every array. Callers: highlight/search.h (rising
+// edges of the loudness curve), beat/candidates.h (peaks of the onset envelope).
 #ifndef TAVO_DSP_PEAKS_H
 #define TAVO_DSP_PEAKS_H
 

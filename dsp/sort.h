@@ -1,4 +1,5 @@
 // Comparators for qsort, none of which reports equality, and an in-place quicksort of doubles.
+// Callers: dsp/peaks.h, beat/power_rise.h (block levels).
 #ifndef TAVO_DSP_SORT_H
 #define TAVO_DSP_SORT_H
 

@@ -1,4 +1,5 @@
-// Mean and population standard deviation, in two passes in index order. NaN for n = 0.
+// Mean and population standard deviation, in two passes in index order. NaN for n = 0. Callers:
+// beat/onset_envelope.h (doubles), highlight/search.h (floats).
 #ifndef TAVO_DSP_STATS_H
 #define TAVO_DSP_STATS_H
 

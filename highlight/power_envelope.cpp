@@ -3,28 +3,28 @@
 #include <cmath>
 #include <cstdlib>
 
+#include "dsp/lanes.h"
+
 namespace {
 
 constexpr int kSections = 2;  // parts of the song summed side by side
 constexpr int kOverlap = 3;   // windows that hold each sample
 
-typedef double PAIR __attribute__((vector_size(16)));  // one value per section
-
 float power_of_sum(double sum, int64_t window) {
-    const float mean = static_cast<float>(sum / static_cast<double>(window));
+    const auto mean = static_cast<float>(sum / static_cast<double>(window));
     return 10.0f * log10f(mean + 1.0f);
 }
 
 // Adds hop samples of both sections to the three sums that run over them. Every sum takes its
 // samples in their own order, so it has the bits of a window summed alone.
-void add_hop(PAIR sums[kOverlap], const int16_t *first, const int16_t *second, int64_t hop) {
-    PAIR oldest = sums[0];
-    PAIR middle = sums[1];
-    PAIR newest = sums[2];
-    for (int64_t i = 0; i < hop; i++) {
-        const PAIR x = {static_cast<double>(first[i]), static_cast<double>(second[i])};
-        const PAIR level = x * kInverseHead + x * kInverseTail;
-        const PAIR square = level * level;
+void add_hop(double_pair sums[kOverlap], const int16_t *first, const int16_t *second, int64_t hop) {
+    double_pair oldest = sums[0];
+    double_pair middle = sums[1];
+    double_pair newest = sums[2];
+    for (int64_t i = 0; i < hop; ++i) {
+        const double_pair x = {static_cast<double>(first[i]), static_cast<double>(second[i])};
+        const double_pair level = x * kInverseHead + x * kInverseTail;
+        const double_pair square = level * level;
         oldest += square;
         middle += square;
         newest += square;
@@ -38,8 +38,8 @@ void add_hop(PAIR sums[kOverlap], const int16_t *first, const int16_t *second, i
 
 float window_power(const int16_t *pcm, int64_t window) {
     double sum = 0.0;
-    for (int64_t i = 0; i < window; i++) {
-        const double x = static_cast<double>(pcm[i]);
+    for (int64_t i = 0; i < window; ++i) {
+        const auto x = static_cast<double>(pcm[i]);
         const double level = x * kInverseHead + x * kInverseTail;
         sum += level * level;
     }
@@ -51,8 +51,8 @@ void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *o
     // With an odd count the sections share a window, which both give the same value.
     const int64_t length = (count + kSections - 1) / kSections;
     const int64_t second = count - length;
-    PAIR sums[kOverlap] = {};
-    for (int64_t k = 0; k < length + kOverlap - 1; k++) {
+    double_pair sums[kOverlap] = {};
+    for (int64_t k = 0; k < length + kOverlap - 1; ++k) {
         const int16_t *samples = pcm + k * hop;
         add_hop(sums, samples, samples + second * hop, hop);
         const int64_t done = k - (kOverlap - 1);  // the window that ends with this hop
@@ -62,7 +62,7 @@ void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *o
         }
         sums[0] = sums[1];
         sums[1] = sums[2];
-        sums[2] = PAIR{0.0, 0.0};
+        sums[2] = double_pair{0.0, 0.0};
     }
 }
 
@@ -75,7 +75,7 @@ int32_t _calc_power_level(const int16_t *pcm, int64_t sample_count, int32_t rate
     const int64_t hop = kPowerHopSeconds * rate;
     const int64_t count = last / hop + 1;
     if (count > INT32_MAX) return 0;
-    float *power = static_cast<float *>(malloc(static_cast<size_t>(count) * sizeof(float)));
+    auto *power = static_cast<float *>(malloc(static_cast<size_t>(count) * sizeof(float)));
     if (power == nullptr) return 0;
     static_assert(kPowerWindowSeconds == kOverlap * kPowerHopSeconds);
     overlapping_powers(pcm, hop, count, power);

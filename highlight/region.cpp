@@ -8,7 +8,7 @@ constexpr int32_t kScanEnd = 24;      // 48 s, included
 constexpr int64_t kMinReach = 3;      // points before chosen worth moving the start for
 constexpr int64_t kNearIdeal = 2;     // a valley this close to the ideal start is taken at once
 
-struct SONG {
+struct song_curve {
     const float *norm;
     int32_t n;
     int32_t nv;
@@ -20,7 +20,7 @@ struct SONG {
 };
 
 // A list entry near the ideal start.
-struct CANDIDATE {
+struct candidate {
     bool present;
     bool ran_out;  // the distance still fell at the list's last entry
     int32_t pos;
@@ -33,7 +33,7 @@ int64_t distance(int64_t a, int64_t b) {
 
 // Walks list from index first in steps of step, up to and with index last, while the entries come
 // strictly nearer to ideal.
-CANDIDATE walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_t last,
+candidate walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_t last,
                        int32_t step) {
     int32_t k = first;
     int64_t nearest = distance(list[k], ideal);
@@ -45,21 +45,21 @@ CANDIDATE walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_
 }
 
 // Index of the last valley not after chosen; -1 when there is none.
-int32_t valley_before(const SONG *song, int32_t chosen) {
+int32_t valley_before(const song_curve *song, int32_t chosen) {
     int32_t k = 0;
-    while (k < song->nv && song->valleys[k] <= chosen) k++;
+    while (k < song->nv && song->valleys[k] <= chosen) ++k;
     return k - 1;
 }
 
 // The loudness has fallen below last and stays below the mean. Beyond the song's end nothing is
 // known to be below it.
-bool is_drop(const SONG *song, int32_t idx, float last) {
+bool is_drop(const song_curve *song, int32_t idx, float last) {
     if (!(song->norm[idx] < last) || idx + 3 >= song->n) return false;
     return (song->norm[idx + 2] + song->norm[idx + 3]) * 0.5f < song->mean;
 }
 
-int32_t segment_end(const SONG *song, int32_t chosen, int32_t otherwise) {
-    for (int32_t k = 0; k < song->nseg; k++) {
+int32_t segment_end(const song_curve *song, int32_t chosen, int32_t otherwise) {
+    for (int32_t k = 0; k < song->nseg; ++k) {
         if (song->pairs[2 * k] <= chosen && chosen < song->pairs[2 * k + 1]) {
             return song->pairs[2 * k + 1];
         }
@@ -68,14 +68,14 @@ int32_t segment_end(const SONG *song, int32_t chosen, int32_t otherwise) {
 }
 
 // Where a region that begins at chosen ends when no valley tells.
-int32_t scan_for_end(const SONG *song, int32_t chosen) {
+int32_t scan_for_end(const song_curve *song, int32_t chosen) {
     const float reference = song->norm[chosen];
     float last = reference;
     float lowest = 1.0f;
     int32_t lowest_pos = 0;
     int32_t drop_pos = 0;
     bool found = false;
-    for (int32_t step = kScanBegin; step <= kScanEnd; step++) {
+    for (int32_t step = kScanBegin; step <= kScanEnd; ++step) {
         if (step >= song->n - chosen) {
             if (lowest_pos == 0 && !found) return song->n - 1;
             break;
@@ -96,9 +96,9 @@ int32_t scan_for_end(const SONG *song, int32_t chosen) {
     return found ? drop_pos : segment_end(song, chosen, lowest_pos);
 }
 
-int64_t place_start(const SONG *song, int32_t chosen, int32_t before, int64_t reach) {
+int64_t place_start(const song_curve *song, int32_t chosen, int32_t before, int64_t reach) {
     const int64_t ideal = chosen - reach;
-    CANDIDATE valley = {};
+    candidate valley = {};
     if (before >= 0 && song->valleys[before] < chosen) {
         valley = walk_towards(ideal, song->valleys, before, 0, -1);
         if (valley.distance <= kNearIdeal) {
@@ -106,7 +106,7 @@ int64_t place_start(const SONG *song, int32_t chosen, int32_t before, int64_t re
             valley.present = false;
         }
     }
-    CANDIDATE segment = {};
+    candidate segment = {};
     if (song->nseg >= 1) {
         segment = walk_towards(ideal, song->pairs, 0, 2 * song->nseg - 1, 1);
     }
@@ -118,7 +118,7 @@ int64_t place_start(const SONG *song, int32_t chosen, int32_t before, int64_t re
     return ideal > 0 ? ideal : 0;
 }
 
-int64_t fit_in_song(const SONG *song, int64_t start, int32_t len_pts) {
+int64_t fit_in_song(const song_curve *song, int64_t start, int32_t len_pts) {
     if (start + len_pts <= song->n) return start;
     const int64_t valley = song->nv > 0 ? song->valleys[0] : 0;
     const int64_t segment = song->nseg > 0 ? song->pairs[0] : 0;
@@ -132,12 +132,12 @@ uint32_t tavo_select_highlight_region(const float *norm, int32_t n, int32_t len_
                                       int32_t nv, const int32_t *valleys, const int32_t *pairs,
                                       int32_t nseg, float mean, float std) {
     if (chosen < 0 || chosen >= n) return 0;
-    const SONG song = {norm, n, nv, valleys, pairs, nseg, mean, std};
+    const song_curve song = {norm, n, nv, valleys, pairs, nseg, mean, std};
     const int32_t before = valley_before(&song, chosen);
     const bool valley_follows = before + 1 < nv && valleys[before + 1] - chosen <= kMaxToValley;
     const int32_t end = valley_follows ? valleys[before + 1] : scan_for_end(&song, chosen);
     const int32_t length = end > chosen ? end - chosen : 0;
-    const int64_t reach = static_cast<int64_t>(len_pts) - length;  // points wanted before chosen
+    const auto reach = static_cast<int64_t>(len_pts) - length;  // points wanted before chosen
     const int64_t start = reach < kMinReach ? chosen : place_start(&song, chosen, before, reach);
     return static_cast<uint32_t>(fit_in_song(&song, start, len_pts));
 }

@@ -28,7 +28,7 @@ constexpr float kHopSeconds = 2.0f;
 constexpr double kMinSecondScore = 0.1;
 
 // The song as the search sees it. Entries of the lists beyond their counts are 0.
-struct SEARCH {
+struct search_state {
     const float *norm;  // [n] envelope over its largest value
     const float *diff;  // [n - 1] steps of norm
     int32_t n;
@@ -59,8 +59,8 @@ bool power_before(float a, float b) {
 // The largest value, and the 60th percentile in *percentile. False when memory runs out.
 // std::sort asks for no memory; qsort without memory relies on a comparator that can say "equal".
 bool rank_envelope(const float *power, int32_t n, float *largest, float *percentile) {
-    const size_t count = static_cast<size_t>(n);
-    float *sorted = static_cast<float *>(malloc(count * sizeof(float)));
+    const auto count = static_cast<size_t>(n);
+    auto *sorted = static_cast<float *>(malloc(count * sizeof(float)));
     if (sorted == nullptr) return false;
     memcpy(sorted, power, count * sizeof(float));
     std::sort(sorted, sorted + count, power_before);
@@ -70,15 +70,15 @@ bool rank_envelope(const float *power, int32_t n, float *largest, float *percent
     return true;
 }
 
-void find_segments(SEARCH *s) {
+void find_segments(search_state *s) {
     bool above = false;  // whatever point 0 is: a song loud from there opens its segment at 0
-    for (int32_t k = 0; k < s->n - 1 && s->nseg < kMaxSegments; k++) {
+    for (int32_t k = 0; k < s->n - 1 && s->nseg < kMaxSegments; ++k) {
         const bool next_above = s->norm[k + 1] > s->mean;
         if (!above && next_above) s->start[s->nseg] = k;
         if (above && !next_above) {
             if (k - s->start[s->nseg] + 1 >= kMinSegment) {
                 s->end[s->nseg] = k;
-                s->nseg++;
+                ++s->nseg;
             } else {
                 s->start[s->nseg] = 0;
             }
@@ -88,29 +88,29 @@ void find_segments(SEARCH *s) {
 }
 
 // Points from pos to the first valley after it; 0 when there is none.
-int32_t valley_distance(const SEARCH *s, int32_t pos) {
-    for (int32_t k = 0; k < s->nv; k++) {
+int32_t valley_distance(const search_state *s, int32_t pos) {
+    for (int32_t k = 0; k < s->nv; ++k) {
         if (s->valley[k] > pos) return s->valley[k] - pos;
     }
     return 0;
 }
 
-bool in_segment(const SEARCH *s, int32_t pos) {
+bool in_segment(const search_state *s, int32_t pos) {
     if (pos > s->n - s->tail) return false;
-    for (int32_t k = 0; k < s->nseg; k++) {
+    for (int32_t k = 0; k < s->nseg; ++k) {
         if (s->start[k] <= pos && pos + kMinLoudAfter <= s->end[k]) return true;
     }
     return false;
 }
 
 // The best scored edge, or the second best when none is; 0 when no edge has a score.
-int32_t score_edges(const SEARCH *s) {
+int32_t score_edges(const search_state *s) {
     float best = 0.0f;
     float second = 0.0f;
     int32_t best_pos = 0;
     int32_t second_pos = 0;
-    for (int32_t k = 0; k < s->edges; k++) {
-        const int32_t pos = static_cast<int32_t>(s->edge[k]) + s->skip;
+    for (int32_t k = 0; k < s->edges; ++k) {
+        const auto pos = static_cast<int32_t>(s->edge[k]) + s->skip;
         if (!in_segment(s, pos)) continue;
         const int32_t distance = valley_distance(s, pos);
         if (distance >= 1 && distance <= kNearValley) continue;
@@ -131,9 +131,9 @@ int32_t score_edges(const SEARCH *s) {
 }
 
 // The first edge that leads to a loud point; the last edge when none does.
-int32_t first_loud_edge(const SEARCH *s) {
+int32_t first_loud_edge(const search_state *s) {
     int32_t pos = 0;
-    for (int32_t k = 0; k < s->edges; k++) {
+    for (int32_t k = 0; k < s->edges; ++k) {
         pos = static_cast<int32_t>(s->edge[k]) + s->skip + 1;
         const int32_t distance = valley_distance(s, pos);
         const bool clear = distance == 0 || distance > kNearValley;
@@ -142,25 +142,25 @@ int32_t first_loud_edge(const SEARCH *s) {
     return pos;
 }
 
-int32_t choose_edge(const SEARCH *s) {
+int32_t choose_edge(const search_state *s) {
     const int32_t scored = score_edges(s);
     return scored != 0 ? scored : first_loud_edge(s);
 }
 
 // Where the region may begin when it would run past the song's end.
-int32_t fallback_point(const SEARCH *s) {
+int32_t fallback_point(const search_state *s) {
     const int32_t start = s->nseg > 0 ? s->start[0] : 0;
     const int32_t valley = s->nv > 0 ? s->valley[0] : 0;
     if (s->nseg > 0 && s->nv > 0) return start < valley ? start : valley;
     return start > valley ? start : valley;
 }
 
-int64_t place_region(const SEARCH *s, int32_t chosen, int32_t hl_param) {
-    const int32_t len_pts = static_cast<int32_t>(0.5f * static_cast<float>(hl_param));
+int64_t place_region(const search_state *s, int32_t chosen, int32_t hl_param) {
+    const auto len_pts = static_cast<int32_t>(0.5f * static_cast<float>(hl_param));
     const int32_t fallback = fallback_point(s);
     if (static_cast<int64_t>(fallback) + len_pts >= s->n) return fallback;
     int32_t pairs[2 * kMaxSegments];
-    for (int32_t k = 0; k < s->nseg; k++) {
+    for (int32_t k = 0; k < s->nseg; ++k) {
         pairs[2 * k] = s->start[k];
         pairs[2 * k + 1] = s->end[k];
     }
@@ -170,7 +170,7 @@ int64_t place_region(const SEARCH *s, int32_t chosen, int32_t hl_param) {
 
 // norm: [n] and diff: [n - 1], room to work in. Returns milliseconds.
 uint32_t search_envelope(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm, float *diff) {
-    SEARCH s = {};
+    search_state s = {};
     s.norm = norm;
     s.diff = diff;
     s.n = hl->power_count;
@@ -182,8 +182,8 @@ uint32_t search_envelope(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm,
     if (!rank_envelope(hl->power, s.n, &largest, &s.percentile)) return 0;
     if (largest == 0.0f) return 0;
     s.percentile /= largest;
-    for (int32_t k = 0; k < s.n; k++) norm[k] = hl->power[k] / largest;
-    for (int32_t k = 0; k + 1 < s.n; k++) diff[k] = norm[k + 1] - norm[k];
+    for (int32_t k = 0; k < s.n; ++k) norm[k] = hl->power[k] / largest;
+    for (int32_t k = 0; k + 1 < s.n; ++k) diff[k] = norm[k + 1] - norm[k];
     getfloatMeanStd(norm, s.n, &s.mean, &s.std);
 
     find_segments(&s);
@@ -198,8 +198,8 @@ uint32_t search_envelope(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm,
 
 uint32_t _get_HL_simple(TAVO_HL_CTX *hl, int32_t duration_s) {
     if (hl->power == nullptr || hl->power_count < 1) return 0;
-    const size_t count = static_cast<size_t>(hl->power_count);
-    float *norm = static_cast<float *>(malloc(2 * count * sizeof(float)));
+    const auto count = static_cast<size_t>(hl->power_count);
+    auto *norm = static_cast<float *>(malloc(2 * count * sizeof(float)));
     if (norm == nullptr) return 0;
     const uint32_t start = search_envelope(hl, duration_s, norm, norm + count);
     free(norm);

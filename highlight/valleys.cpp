@@ -30,14 +30,14 @@ int32_t tavo_find_valley(const float *values, int32_t n, int32_t *out, float mea
     int32_t written = 0;
     int32_t lows = 0;
     int32_t last_low = 0;
-    for (int32_t i = 0; i < n; i++) {
+    for (int32_t i = 0; i < n; ++i) {
         if (!(values[i] < threshold)) continue;
         // A stretch that ends at the song's first point is its opening, no valley.
         if (lows > 0 && i - last_low >= gap && last_low != 0) {
             out[written++] = last_low;
             if (written == kMaxValleys) return written;
         }
-        lows++;
+        ++lows;
         last_low = i;
     }
     if (lows > 0) out[written++] = last_low;
