@@ -8,66 +8,65 @@ namespace {
 
 // What lasts for one call of get_frm.
 struct decoding {
-    const codec_source_ops *ops;
+    const codec_source *source;
     wexa_output output;
     wexa_status status;
     bool failed_before;  // the previous decode of this call
 };
 
-// The reader's and the decoder's byte counts come from another binary: one that cannot be true ends
-// the call.
-bool possible(int32_t bytes, int32_t room) {
+void *stream_of(const codec_source &source, const mtsrc_ctx *src) {
+    return source.container->close_stream != nullptr ? src->dstream : src->demux;
+}
+
+// Byte counts come from another binary: an impossible one ends the call.
+bool is_possible(int32_t bytes, int32_t room) {
     return bytes >= 0 && bytes <= room;
 }
 
+// Queues the PCM of the frame decoded last.
+int32_t queue_decoded(mtsrc_ctx *src, const decoding &call, int64_t first) {
+    const int32_t bytes = call.output.bytes;
+    if (!is_possible(bytes, src->q_room + call.source->codec->spare_bytes)) return TAVO_ERR_READ;
+    const int32_t kept = call.source->reduce(src, bytes, first);
+    if (kept > src->q_room) return TAVO_ERR_READ;
+    pcm_queue_push(src, kept);
+    return TAVO_OK;
+}
+
+// One frame from the container through the decoder into the queue.
 int32_t fill_step(mtsrc_ctx *src, uint8_t *frame_buf, void *work) {
-    auto *now = static_cast<decoding *>(work);
-    const codec_source_ops &ops = *now->ops;
+    auto *call = static_cast<decoding *>(work);
+    const codec_ops *codec = call->source->codec;
     wexa_frame frame = {};
     frame.data = frame_buf;
     int64_t first = 0;
-    const int32_t result = ops.read(src, &frame, &first);
-    if (result != 0) {
-        return result == 1 ? 1 : -6;
-    }
-    if (!ops.decode || !possible(frame.bytes, src->frm_buf_size)) {
-        return -6;
-    }
+    int64_t second = 0;
+    const int32_t result = call->source->container->get_frm(
+        stream_of(*call->source, src), frame_buf, src->frm_buf_size, &frame.bytes, &first, &second);
+    if (result == kWexaEndOfStream) return kMtsrcEndOfStream;
+    if (result != 0 || codec == nullptr) return TAVO_ERR_READ;
+    if (!is_possible(frame.bytes, src->frm_buf_size)) return TAVO_ERR_READ;
+
     frame.codec = src->codec;
-    now->output.data = src->q_wr;
-    if (ops.decode(src->decoder, &frame, &now->output, &now->status) != 0) {
-        if (now->failed_before) {
-            return -6;
-        }
-        now->failed_before = true;
-        ops.reset(src->decoder);
-        return 0;
+    call->output.data = src->q_wr;
+    if (codec->decode(src->decoder, &frame, &call->output, &call->status) != 0) {
+        if (call->failed_before) return TAVO_ERR_READ;
+        call->failed_before = true;
+        codec->reset(src->decoder);
+        return TAVO_OK;
     }
-    now->failed_before = false;
-    if (now->status.produced == 0) {
-        return 0;
-    }
-    if (!possible(now->output.bytes, src->q_room + ops.spare)) {
-        return -6;
-    }
-    const int32_t kept = ops.reduce(src, now->output.bytes, first);
-    if (kept > src->q_room) {
-        return -6;
-    }
-    pcm_queue_push(src, kept);
-    return 0;
+    call->failed_before = false;
+    return call->status.produced != 0 ? queue_decoded(src, *call, first) : TAVO_OK;
 }
 
-void free_buffer(void **place) {
-    free(*place);
-    *place = nullptr;
+void free_buffer(void **buffer) {
+    free(*buffer);
+    *buffer = nullptr;
 }
 
 // The record itself stays the codec library's.
 void free_tag_buffers(wexa_tags *tags) {
-    for (wexa_tag_text &text : tags->text) {
-        free_buffer(&text.data);
-    }
+    for (wexa_tag_text &text : tags->text) free_buffer(&text.data);
     for (wexa_tag_entry &entry : tags->entry) {
         free_buffer(&entry.first);
         free_buffer(&entry.second);
@@ -77,52 +76,11 @@ void free_tag_buffers(wexa_tags *tags) {
 
 }  // namespace
 
-int32_t codec_source_get_frm(const codec_source_ops &ops, mtsrc_ctx *src, int32_t want,
-                             mtsrc_frame *frame) {
-    decoding now = {};
-    now.ops = &ops;
-    return pcm_queue_get(src, want, frame, {fill_step, &now});
-}
-
-int32_t codec_source_seek(const codec_source_ops &ops, mtsrc_ctx *src, int64_t position,
-                          int64_t *reached) {
-    codec_source_reset(ops, src);
-    return ops.move(src, &position, reached) == 0 ? 0 : -4;
-}
-
-int32_t codec_source_reset(const codec_source_ops &ops, mtsrc_ctx *src) {
-    if (ops.reset) {
-        ops.reset(src->decoder);
+int32_t codec_source_first_audio(const int32_t *kinds, int32_t count) {
+    for (int32_t i = 0; i < count; ++i) {
+        if (kinds[i] == kWexaKindAudio) return i;
     }
-    pcm_queue_clear(src);
-    return 0;
-}
-
-void codec_source_close(const codec_source_ops &ops, mtsrc_ctx *src) {
-    if (src->dstream && ops.close_stream) {
-        ops.close_stream(src->dstream);
-        src->dstream = nullptr;
-    }
-    if (src->demux) {
-        ops.remove_reader(src->demux);
-        src->demux = nullptr;
-    }
-    if (src->decoder && ops.remove_decoder) {
-        ops.remove_decoder(src->decoder);
-        src->decoder = nullptr;
-    }
-    ops.deinit();
-}
-
-int32_t codec_source_finish_open(const codec_source_ops &ops, mtsrc_ctx *src, wexa_tags *tags,
-                                 int32_t code) {
-    if (tags) {
-        free_tag_buffers(tags);
-    }
-    if (code != 0) {
-        codec_source_close(ops, src);
-    }
-    return code;
+    return -1;
 }
 
 int32_t codec_source_keep_first(const mtsrc_ctx *src, int32_t bytes, int64_t /*first*/) {
@@ -133,6 +91,71 @@ int32_t codec_source_keep_all(const mtsrc_ctx * /*src*/, int32_t bytes, int64_t 
     return bytes;
 }
 
-xaac_config codec_source_aac_config(int32_t sample_rate, int32_t channels) {
-    return {{1, 2, 2, 0}, 3, sample_rate, channels, 0};
+int32_t codec_source_begin_open(mtsrc_ctx *src, int32_t (*init)()) {
+    if (src == nullptr) return TAVO_ERR_HANDLE;
+    if (src->probe_file == nullptr) return TAVO_ERR_OPEN;
+    if (init() != 0) return TAVO_ERR_CODEC;
+    src->demux = nullptr;
+    src->dstream = nullptr;
+    src->decoder = nullptr;
+    return TAVO_OK;
+}
+
+int32_t codec_source_use(mtsrc_ctx *src, const codec_ops &codec, void *decoder,
+                         const mtsrc_format &format) {
+    src->decoder = decoder;
+    if (decoder == nullptr) return TAVO_ERR_CODEC;
+    src->frm_buf_size = codec.frame_bytes;
+    src->codec = codec.code;
+    src->format = format;
+    const bool accepted =
+        format.sample_rate >= codec.min_rate && format.sample_rate <= codec.max_rate;
+    return accepted ? TAVO_OK : TAVO_ERR_FORMAT;
+}
+
+int32_t codec_source_end_open(const codec_source &source, mtsrc_ctx *src, wexa_tags *tags,
+                              int32_t code) {
+    if (tags != nullptr) free_tag_buffers(tags);
+    if (code != TAVO_OK) codec_source_close(source, src);
+    return code;
+}
+
+void codec_source_close(const codec_source &source, mtsrc_ctx *src) {
+    if (src == nullptr) return;
+    const container_ops *container = source.container;
+    if (src->dstream != nullptr && container->close_stream != nullptr) {
+        container->close_stream(src->dstream);
+        src->dstream = nullptr;
+    }
+    if (src->demux != nullptr) {
+        container->remove(src->demux);
+        src->demux = nullptr;
+    }
+    if (src->decoder != nullptr && source.codec != nullptr) {
+        source.codec->remove(src->decoder);
+        src->decoder = nullptr;
+    }
+    container->deinit();
+}
+
+int32_t codec_source_get_frm(const codec_source &source, mtsrc_ctx *src, int32_t want,
+                             mtsrc_frame *frame) {
+    if (src == nullptr) return TAVO_ERR_HANDLE;
+    decoding call = {};
+    call.source = &source;
+    return pcm_queue_get(src, want, frame, {fill_step, &call});
+}
+
+int32_t codec_source_seek(const codec_source &source, mtsrc_ctx *src, int64_t position,
+                          int64_t *reached) {
+    if (codec_source_reset(source, src) != TAVO_OK) return TAVO_ERR_HANDLE;
+    const int32_t result = source.container->seek(stream_of(source, src), &position, reached);
+    return result == 0 ? TAVO_OK : TAVO_ERR_HANDLE;
+}
+
+int32_t codec_source_reset(const codec_source &source, mtsrc_ctx *src) {
+    if (src == nullptr) return TAVO_ERR_HANDLE;
+    if (source.codec != nullptr) source.codec->reset(src->decoder);
+    pcm_queue_clear(src);
+    return TAVO_OK;
 }

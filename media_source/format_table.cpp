@@ -25,9 +25,7 @@ constexpr format_ops kFormats[] = {
 
 const format_ops *format_ops_of(int32_t type) {
     for (const format_ops &format : kFormats) {
-        if (format.type == type) {
-            return &format;
-        }
+        if (format.type == type) return &format;
     }
     return nullptr;
 }

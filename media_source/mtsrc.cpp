@@ -12,19 +12,17 @@ constexpr char kMark[] = "KOVA";
 constexpr int32_t kReadOnly = 0;
 
 bool is_open(const mtsrc_ctx *src) {
-    return src && memcmp(&src->mark, kMark, sizeof(src->mark)) == 0;
+    return src != nullptr && memcmp(&src->mark, kMark, sizeof src->mark) == 0;
 }
 
-// The handle with its queue and lock; null when memory runs out.
+// A handle with its queue and lock; null when memory runs out.
 mtsrc_ctx *new_handle(const mtsrc_io *io) {
     auto *src = static_cast<mtsrc_ctx *>(calloc(1, sizeof(mtsrc_ctx)));
-    if (!src) {
-        return nullptr;
-    }
+    if (src == nullptr) return nullptr;
     src->q_cap = kQueueBytes;
     // Zeroed: bytes that count but hold no sample are delivered as well.
     src->q_base = static_cast<uint8_t *>(calloc(1, kQueueBytes + kQueueSpareBytes));
-    if (!src->q_base || pthread_mutex_init(&src->lock, nullptr) != 0) {
+    if (src->q_base == nullptr || pthread_mutex_init(&src->lock, nullptr) != 0) {
         free(src->q_base);
         free(src);
         return nullptr;
@@ -35,17 +33,16 @@ mtsrc_ctx *new_handle(const mtsrc_io *io) {
     return src;
 }
 
-// The file, open, with its format source stored in the handle. Returns 0, -3, -6 or -7.
+// Opens and recognises the file and stores its format source in the handle. Returns 0,
+// TAVO_ERR_FORMAT, TAVO_ERR_READ or TAVO_ERR_OPEN.
 int32_t choose_source(mtsrc_ctx *src) {
     mtsrc_file *file = src->io.open(&src->io, kReadOnly);
-    if (!file) {
-        return -7;
-    }
-    int32_t code = mtsrc_get_file_type(&src->io, file, &src->codec);
-    const format_ops *ops = code == 0 ? format_ops_of(src->codec) : nullptr;
-    if (!ops) {
+    if (file == nullptr) return TAVO_ERR_OPEN;
+    const int32_t code = mtsrc_get_file_type(&src->io, file, &src->codec);
+    const format_ops *ops = code == TAVO_OK ? format_ops_of(src->codec) : nullptr;
+    if (ops == nullptr) {
         src->io.close(file);
-        return code == 0 ? -3 : code;
+        return code == TAVO_OK ? TAVO_ERR_FORMAT : code;
     }
     src->open = ops->open;
     src->close = ops->close;
@@ -53,18 +50,14 @@ int32_t choose_source(mtsrc_ctx *src) {
     src->seek = ops->seek;
     src->reset = ops->reset;
     src->probe_file = file;
-    return 0;
+    return TAVO_OK;
 }
 
 // A handle whose opening failed; its path stays the caller's.
 void discard(mtsrc_ctx *src) {
     pthread_mutex_destroy(&src->lock);
-    if (src->close) {
-        src->close(src);
-    }
-    if (src->probe_file) {
-        src->io.close(src->probe_file);
-    }
+    if (src->close != nullptr) src->close(src);
+    if (src->probe_file != nullptr) src->io.close(src->probe_file);
     free(src->q_base);
     free(src);
 }
@@ -72,99 +65,79 @@ void discard(mtsrc_ctx *src) {
 }  // namespace
 
 mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err) {
-    if (!err) {
-        return nullptr;
-    }
-    *err = -4;
-    if (!param || !param->path) {
-        return nullptr;
-    }
+    if (err == nullptr) return nullptr;
+    *err = TAVO_ERR_HANDLE;
+    if (param == nullptr || param->path == nullptr) return nullptr;
     mtsrc_io io = {};
     mtsrc_file_callbacks(&io);
     io.path = static_cast<char *>(calloc(1, kPathBytes));
     const size_t length = strnlen(param->path, kPathBytes);
-    if (!io.path || length >= static_cast<size_t>(kPathBytes)) {
-        *err = -3;
+    if (io.path == nullptr || length >= static_cast<size_t>(kPathBytes)) {
+        *err = TAVO_ERR_FORMAT;
         free(io.path);
         return nullptr;
     }
     memcpy(io.path, param->path, length);
     mtsrc_ctx *src = mtsrc_open_mfal(&io, 0, err);
-    if (!src) {
-        free(io.path);
-    }
+    if (src == nullptr) free(io.path);
     return src;
 }
 
 mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t /*flags*/, int32_t *err) {
-    if (!err) {
+    if (err == nullptr) return nullptr;
+    if (io == nullptr || io->open == nullptr) {
+        *err = TAVO_ERR_HANDLE;
         return nullptr;
     }
-    if (!io || !io->open) {
-        *err = -4;
-        return nullptr;
-    }
-    *err = -255;
+    *err = TAVO_ERR_CODEC;
     mtsrc_ctx *src = new_handle(io);
-    if (!src) {
-        *err = -2;
+    if (src == nullptr) {
+        *err = TAVO_ERR_MEMORY;
         return nullptr;
     }
     int32_t code = choose_source(src);
-    if (code == 0) {
-        code = src->open(src);
-    }
+    if (code == TAVO_OK) code = src->open(src);
     *err = code;
-    if (code != 0) {
+    if (code != TAVO_OK) {
         discard(src);
         return nullptr;
     }
-    memcpy(&src->mark, kMark, sizeof(src->mark));
+    memcpy(&src->mark, kMark, sizeof src->mark);
     return src;
 }
 
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt) {
-    if (!is_open(src) || !fmt) {
-        return -4;
-    }
+    if (!is_open(src) || fmt == nullptr) return TAVO_ERR_HANDLE;
     // Field by field: the gap behind bits belongs to the caller.
     fmt->sample_rate = src->format.sample_rate;
     fmt->channels = src->format.channels;
     fmt->bits = src->format.bits;
     fmt->duration = src->format.duration;
-    return 0;
+    return TAVO_OK;
 }
 
 int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached) {
-    if (!is_open(src)) {
-        return -4;
-    }
+    if (!is_open(src)) return TAVO_ERR_HANDLE;
     return src->seek(src, position, reached);
 }
 
 int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
-    if (!is_open(src) || !src->get_frm) {
-        return -4;
-    }
+    if (!is_open(src) || src->get_frm == nullptr) return TAVO_ERR_HANDLE;
     return src->get_frm(src, want, frame);
 }
 
 int32_t mtsrc_reset(mtsrc_ctx *src) {
-    if (!is_open(src)) {
-        return -4;
-    }
+    if (!is_open(src)) return TAVO_ERR_HANDLE;
     pthread_mutex_lock(&src->lock);
     src->reset(src);
     pthread_mutex_unlock(&src->lock);
-    return -5;
+    return kMtsrcDone;
 }
 
 int32_t mtsrc_deinit(mtsrc_ctx *src) {
-    if (!is_open(src)) {
-        return -4;
-    }
+    if (!is_open(src)) return TAVO_ERR_HANDLE;
     pthread_mutex_lock(&src->lock);
-    if (src->probe_file) {
+    if (src->probe_file != nullptr) {
         src->io.close(src->probe_file);
         src->probe_file = nullptr;
     }
@@ -175,5 +148,5 @@ int32_t mtsrc_deinit(mtsrc_ctx *src) {
     src->io = {};
     free(src->q_base);
     free(src);
-    return -5;
+    return kMtsrcDone;
 }

@@ -1,8 +1,8 @@
 /// @file
-/// Stage 1: an audio file becomes a stream of 16-bit mono PCM bytes, read in pieces of any size and
-/// positioned by time.
+/// Stage 1: turns an audio file into a stream of 16-bit mono PCM bytes that is read in pieces of
+/// any size and positioned by time.
 ///
-/// In: a path. Out: PCM at the stream's own rate, native byte order. After: pcm/decode.h.
+/// In: a path. Out: PCM at the stream's own rate, native byte order. Called by pcm/decode.h.
 /// A source is used by one thread at a time; different sources share nothing.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_H
 #define TAVO_MEDIA_SOURCE_MTSRC_H
@@ -31,6 +31,10 @@ struct mtsrc_frame {
     int32_t size;  ///< receives the bytes delivered
 };
 
+// Results besides 0 and the negative codes of tavo.h.
+constexpr int32_t kMtsrcEndOfStream = 1;  ///< mtsrc_getstream: the bytes left were delivered
+constexpr int32_t kMtsrcDone = -5;        ///< mtsrc_reset and mtsrc_deinit did their work
+
 // Type codes of recognition.
 constexpr int32_t kMtsrcTypeMp4 = 2000;        ///< MP4
 constexpr int32_t kMtsrcTypeAsf = 2002;        ///< ASF, which no source reads
@@ -51,8 +55,8 @@ extern "C" {
 /// codec library.
 mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err);
 
-/// The same for a caller's own callback record, which is copied; on success the handle owns
-/// io->path (malloc). flags: 0, not used. On failure the path stays the caller's.
+/// The same for a caller's own callback record, which is copied. On success the handle owns
+/// io->path and releases it with free; on failure the path stays the caller's. flags: not used, 0.
 mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t flags, int32_t *err);
 
 /// Returns 0; -4 bad handle or null fmt.
@@ -63,9 +67,9 @@ int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt);
 /// 0; -4 bad handle or failed seek, after which the queue is empty.
 int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached);
 
-/// Delivers want bytes (at most 8192 by custom). Returns 0 exactly want bytes; 1 end of stream, the
-/// bytes left; -2 out of memory; -4 bad handle or frame, want negative or more than the queue can
-/// hold before the stream ends; -6 read or decode failure.
+/// Delivers want bytes; a request of up to 917,506 bytes always fits the queue. Returns 0 exactly
+/// want bytes; 1 end of stream, the bytes left; -2 out of memory; -4 bad handle or frame, want
+/// negative or more than the queue can hold; -6 read or decode failure.
 int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
 
 /// Empties the queue and resets the decoder. Returns -5 (done); -4 bad handle.
@@ -78,8 +82,9 @@ int32_t mtsrc_deinit(mtsrc_ctx *src);
 /// fits) and the file offset where it was; -6 when 16 bytes cannot be read.
 int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type);
 
-/// A probe; they stand in the order in which they are asked. head: the first 16 bytes. Returns a
-/// type code.
+/// The probes, in the order of their calls. head: the first 16 bytes of the file, which stands at
+/// any offset and is left there. A probe uses only read, tell, seek and skip of io. Returns a type
+/// code.
 /// @{
 int32_t mtsrc_probe_asf(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 int32_t mtsrc_probe_mp4(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);

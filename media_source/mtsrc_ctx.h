@@ -1,17 +1,20 @@
-// The source handle, for the frame and the format sources only.
+// The source handle, known only to the frame (mtsrc.cpp) and the format sources.
+//
+// The frame allocates it, recognises the file and calls the format through the five operations.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_CTX_H
 #define TAVO_MEDIA_SOURCE_MTSRC_CTX_H
 
 #include <pthread.h>
 
+#include "core/tavo.h"
 #include "media_source/mtsrc.h"
 
-constexpr int32_t kQueueBytes = 1'048'576;
-// Allocated behind the queue's q_cap bytes. The largest FLAC block decodes to 262,140 bytes, of
-// which half stay after the reduction to one channel; q_room exceeds 131,070 before each frame.
+constexpr int32_t kQueueBytes = 1'048'576;  // of q_cap
+// Allocated behind the queue's q_cap bytes: the largest FLAC block decodes to 262,140 bytes, of
+// which half are left in one channel, and q_room exceeds 131,070 before each frame.
 constexpr int32_t kQueueSpareBytes = 131'070;
 
-// Codec codes of the codec library, handed to its decoders in every frame record.
+// Codec codes of the codec library. Its decoders get them in every frame record.
 constexpr int32_t kCodecMpeg = 305;
 constexpr int32_t kCodecAac = 306;
 constexpr int32_t kCodecFlac = 322;
@@ -48,7 +51,10 @@ static_assert(offsetof(mtsrc_ctx, lock) == 280);
 
 extern "C" {
 
-// The five operations of each format source; open returns 0 or the frame's error codes.
+// The five operations of each format source. open creates reader and decoder, fills the handle and
+// returns 0, TAVO_ERR_HANDLE, TAVO_ERR_FORMAT, TAVO_ERR_OPEN or TAVO_ERR_CODEC. close accepts a
+// handle whose open failed. The other three are the bodies of mtsrc_getstream, mtsrc_seekstream and
+// mtsrc_reset; reset returns 0.
 int32_t mtsource_wav_open(mtsrc_ctx *src);
 void mtsource_wav_close(mtsrc_ctx *src);
 int32_t mtsource_wav_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
@@ -85,11 +91,10 @@ int32_t mtsource_ogg_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
 int32_t mtsource_ogg_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
 int32_t mtsource_ogg_reset(mtsrc_ctx *src);
 
-// Sample rate that the decoder reports for the next frame, which is consumed; -1 on failure.
+// Sample rate (Hz) that the decoder reports for the next frame, which is consumed; -1 on failure.
 int32_t aac_get_hz(void *reader, void *decoder);
 
-// Index of the first audio track or stream, -1 without one. The argument is the file-information
-// record.
+// Index of the first audio track or stream, -1 without one. info: an xmp4_info or an xogg_info.
 int32_t get_mp4_audiostream(const void *info);
 int32_t get_ogg_audiostream(const void *info);
 }

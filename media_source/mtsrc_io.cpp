@@ -11,9 +11,10 @@ namespace {
 
 constexpr int32_t kModeReadWrite = 1;
 constexpr mode_t kPermissions = 0644;
+constexpr int32_t kFailed = -1;
 
 int open_path(const char *path, int32_t mode) {
-    const int flags = (mode & kModeReadWrite) ? O_RDWR | O_CREAT : O_RDONLY;
+    const int flags = (mode & kModeReadWrite) != 0 ? O_RDWR | O_CREAT : O_RDONLY;
     int fd;
     do {
         fd = open(path, flags | O_LARGEFILE | O_CLOEXEC, kPermissions);
@@ -21,45 +22,37 @@ int open_path(const char *path, int32_t mode) {
     return fd;
 }
 
-bool usable(const mtsrc_file *file) {
-    return file && file->fd >= 0;
+bool is_usable(const mtsrc_file *file) {
+    return file != nullptr && file->fd >= 0;
 }
 
 }  // namespace
 
 mtsrc_file *mtsrc_file_open(const mtsrc_io *io, int32_t mode) {
-    if (!io || !io->path) {
-        return nullptr;
-    }
+    if (io == nullptr || io->path == nullptr) return nullptr;
     auto *file = static_cast<mtsrc_file *>(malloc(sizeof(mtsrc_file)));
-    if (!file) {
-        return nullptr;
-    }
+    if (file == nullptr) return nullptr;
     file->fd = strcmp(io->path, "fd") == 0 ? dup(io->fd) : open_path(io->path, mode);
     if (file->fd < 0) {
         free(file);
         return nullptr;
     }
-    // A duplicate shares its offset with the original. What cannot be positioned, a pipe say, fails
-    // at the first tell.
+    // A duplicate shares its offset with the original. A pipe cannot be positioned: it fails at the
+    // first tell.
     lseek64(file->fd, 0, SEEK_SET);
     return file;
 }
 
 int32_t mtsrc_file_close(mtsrc_file *file) {
-    if (!file) {
-        return -1;
-    }
+    if (file == nullptr) return kFailed;
     // No retry after EINTR: the descriptor is gone by then.
     const int result = file->fd == -1 ? 0 : close(file->fd);
     free(file);
-    return result == 0 ? 0 : -1;
+    return result == 0 ? 0 : kFailed;
 }
 
 int64_t mtsrc_file_read(mtsrc_file *file, void *buf, int32_t count) {
-    if (!usable(file) || count < 0) {
-        return -1;
-    }
+    if (!is_usable(file) || count < 0) return kFailed;
     ssize_t got;
     do {
         got = read(file->fd, buf, static_cast<size_t>(count));
@@ -68,9 +61,7 @@ int64_t mtsrc_file_read(mtsrc_file *file, void *buf, int32_t count) {
 }
 
 int64_t mtsrc_file_write(mtsrc_file *file, const void *buf, int32_t count) {
-    if (!usable(file) || count < 0) {
-        return -1;
-    }
+    if (!is_usable(file) || count < 0) return kFailed;
     ssize_t written;
     do {
         written = write(file->fd, buf, static_cast<size_t>(count));
@@ -79,40 +70,28 @@ int64_t mtsrc_file_write(mtsrc_file *file, const void *buf, int32_t count) {
 }
 
 int32_t mtsrc_file_tell(mtsrc_file *file, int64_t *offset) {
-    if (!usable(file) || !offset) {
-        return -1;
-    }
+    if (!is_usable(file) || offset == nullptr) return kFailed;
     const int64_t now = lseek64(file->fd, 0, SEEK_CUR);
-    if (now < 0) {
-        return -1;
-    }
+    if (now < 0) return kFailed;
     *offset = now;
     return 0;
 }
 
 int32_t mtsrc_file_seek(mtsrc_file *file, const int64_t *offset) {
-    if (!usable(file) || !offset) {
-        return -1;
-    }
-    return lseek64(file->fd, *offset, SEEK_SET) < 0 ? -1 : 0;
+    if (!is_usable(file) || offset == nullptr) return kFailed;
+    return lseek64(file->fd, *offset, SEEK_SET) < 0 ? kFailed : 0;
 }
 
 int32_t mtsrc_file_skip(mtsrc_file *file, const int64_t *distance) {
-    if (!usable(file) || !distance || *distance < 1) {
-        return -1;
-    }
-    return lseek64(file->fd, *distance, SEEK_CUR) < 0 ? -1 : 0;
+    if (!is_usable(file) || distance == nullptr || *distance < 1) return kFailed;
+    return lseek64(file->fd, *distance, SEEK_CUR) < 0 ? kFailed : 0;
 }
 
 int32_t mtsrc_file_size(mtsrc_file *file, int64_t *length) {
     int64_t now = 0;
-    if (!length || mtsrc_file_tell(file, &now) != 0) {
-        return -1;
-    }
+    if (length == nullptr || mtsrc_file_tell(file, &now) != 0) return kFailed;
     const int64_t end = lseek64(file->fd, 0, SEEK_END);
-    if (mtsrc_file_seek(file, &now) != 0 || end < 0) {
-        return -1;
-    }
+    if (mtsrc_file_seek(file, &now) != 0 || end < 0) return kFailed;
     *length = end;
     return 0;
 }

@@ -1,7 +1,7 @@
 /// @file
-/// The file callbacks that a media source hands to the format probes and to the codec library,
-/// which opens and reads the file through them. Another binary reads this record: its layout is
-/// fixed.
+/// File access of stage 1: the callbacks that a media source hands to the format probes and to the
+/// codec library, which opens and reads the file through them. Another binary reads this record, so
+/// its layout is fixed.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_IO_H
 #define TAVO_MEDIA_SOURCE_MTSRC_IO_H
 

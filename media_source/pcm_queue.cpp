@@ -6,8 +6,7 @@
 namespace {
 
 constexpr int32_t kBytesPerSample = 2;
-// In a row: more than four days of MPEG frames without a sample. A reader that hands out nothing
-// for longer hands it out for ever.
+// In a row: more than four days of MPEG frames. A reader that adds nothing for longer never will.
 constexpr int32_t kMaxEmptySteps = 16'777'216;
 
 void make_room(mtsrc_ctx *src) {
@@ -24,37 +23,31 @@ void deliver(mtsrc_ctx *src, int32_t bytes, mtsrc_frame *frame) {
     src->q_fill -= bytes;
 }
 
-// Returns 0 with want bytes held, else what ended the filling; -6 when the steps add nothing.
+// Returns 0 with want bytes held, else the code that ends the call.
 int32_t fill_to(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill &fill) {
     int32_t empty_steps = 0;
     while (src->q_fill < want) {
         if (src->q_room <= src->frm_buf_size) {
             make_room(src);
-            if (src->q_room <= src->frm_buf_size) {
-                return -4;
-            }
+            if (src->q_room <= src->frm_buf_size) return TAVO_ERR_HANDLE;
         }
         const int32_t held = src->q_fill;
         const int32_t code = fill.step(src, frame_buf, fill.work);
-        if (code != 0) {
-            return code;
-        }
+        if (code != TAVO_OK) return code;
         empty_steps = src->q_fill > held ? 0 : empty_steps + 1;
-        if (empty_steps >= kMaxEmptySteps) {
-            return -6;
-        }
+        if (empty_steps >= kMaxEmptySteps) return TAVO_ERR_READ;
     }
-    return 0;
+    return TAVO_OK;
 }
 
 int16_t load(const uint8_t *pcm, int64_t sample) {
     int16_t value;
-    memcpy(&value, pcm + sample * kBytesPerSample, sizeof(value));
+    memcpy(&value, pcm + sample * kBytesPerSample, sizeof value);
     return value;
 }
 
 void store(uint8_t *pcm, int64_t sample, int16_t value) {
-    memcpy(pcm + sample * kBytesPerSample, &value, sizeof(value));
+    memcpy(pcm + sample * kBytesPerSample, &value, sizeof value);
 }
 
 }  // namespace
@@ -73,17 +66,13 @@ void pcm_queue_push(mtsrc_ctx *src, int32_t bytes) {
 }
 
 int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pcm_fill &fill) {
-    if (!frame || !frame->data || want < 0) {
-        return -4;
-    }
+    if (frame == nullptr || frame->data == nullptr || want < 0) return TAVO_ERR_HANDLE;
     auto *frame_buf = static_cast<uint8_t *>(malloc(static_cast<size_t>(src->frm_buf_size)));
-    if (!frame_buf) {
-        return -2;
-    }
+    if (frame_buf == nullptr) return TAVO_ERR_MEMORY;
     const int32_t code = fill_to(src, want, frame_buf, fill);
-    if (code == 0) {
+    if (code == TAVO_OK) {
         deliver(src, want, frame);
-    } else if (code == 1) {
+    } else if (code == kMtsrcEndOfStream) {
         deliver(src, src->q_fill, frame);
     }
     free(frame_buf);
@@ -96,9 +85,7 @@ int32_t pcm_first_channel(uint8_t *to, const uint8_t *from, int32_t bytes, int32
         return bytes;
     }
     const int32_t count = bytes / kBytesPerSample / channels;
-    for (int64_t j = 0; j < count; ++j) {
-        store(to, j, load(from, j * channels));
-    }
+    for (int64_t j = 0; j < count; ++j) store(to, j, load(from, j * channels));
     return bytes / channels;
 }
 

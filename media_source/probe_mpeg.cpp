@@ -1,5 +1,5 @@
-// Recognises MPEG audio by two frame headers that stand exactly one frame length apart within the
-// first bytes of the file.
+// Recognises MPEG audio: within the first 32 KiB two frame headers are exactly one frame length
+// apart.
 #include <cstdlib>
 #include <cstring>
 
@@ -23,7 +23,7 @@ constexpr int32_t kLayerReserved = 0;
 constexpr int32_t kLayer3 = 1;
 constexpr int32_t kLayer2 = 2;
 constexpr int32_t kLayer1 = 3;
-constexpr int32_t kTypeOfLayerBits0 = 306;  // less the layer bits: the type code
+constexpr int32_t kTypeLessLayerBits = 306;  // minus the layer bits: the type code
 
 struct frame_header {
     int32_t version;
@@ -87,19 +87,15 @@ bool refill(scan *s) {
     return s->got > 0;
 }
 
-// Puts what follows the tag at index at into the buffer.
+// Refills the buffer with what follows the tag at index at.
 bool skip_tag(scan *s, int32_t at) {
     int64_t start = 0;
-    if (s->io->tell(s->file, &start) != 0) {
-        return false;
-    }
+    if (s->io->tell(s->file, &start) != 0) return false;
     start += at - s->got;
-    if (s->io->seek(s->file, &start) != 0) {
-        return false;
-    }
+    if (s->io->seek(s->file, &start) != 0) return false;
     uint8_t header[kId3HeaderBytes];
     if (at + kId3HeaderBytes <= s->got) {
-        memcpy(header, s->buf + at, sizeof(header));
+        memcpy(header, s->buf + at, sizeof header);
     } else if (s->io->read(s->file, header, kId3HeaderBytes) != kId3HeaderBytes ||
                s->io->seek(s->file, &start) != 0) {
         return false;
@@ -108,47 +104,33 @@ bool skip_tag(scan *s, int32_t at) {
     return s->io->skip(s->file, &length) == 0 && refill(s);
 }
 
-// Looks at the candidate header at index at. Returns the answer that ends the scan, or 0 to go on.
+// Tests the candidate header at index at. Returns the answer that ends the scan, or 0 to go on.
 int32_t try_candidate(const scan &s, int32_t at) {
     frame_header header;
-    if (!parse(s.buf + at, &header)) {
-        return 0;
-    }
+    if (!parse(s.buf + at, &header)) return 0;
     const int32_t length = frame_length(header);
-    if (length < kMinFrameBytes) {
-        return 0;
-    }
+    if (length < kMinFrameBytes) return 0;
     const int32_t padding = !header.padded ? 0 : header.layer == kLayer1 ? 4 : 1;
     const int32_t next = at + length + padding;
-    if (next >= kNextHeaderEnd) {
-        return kMtsrcTypeUnknown;
-    }
-    if (next + kHeaderBytes > s.got || !parse(s.buf + next, &header)) {
-        return 0;
-    }
-    return kTypeOfLayerBits0 - header.layer;
+    if (next >= kNextHeaderEnd) return kMtsrcTypeUnknown;
+    if (next + kHeaderBytes > s.got || !parse(s.buf + next, &header)) return 0;
+    return kTypeLessLayerBits - header.layer;
 }
 
 int32_t run_scan(scan *s) {
-    if (!refill(s)) {
-        return kMtsrcTypeUnknown;
-    }
+    if (!refill(s)) return kMtsrcTypeUnknown;
     uint32_t window = 0;  // the four bytes up to k
     for (int32_t k = 0; k < s->got; ++k) {
         window = window << 8 | s->buf[k];
         if (window >= 0x49443302 && window <= 0x49443304) {  // "ID3", version 2 to 4
-            if (!skip_tag(s, k - 3)) {
-                return kMtsrcTypeUnknown;
-            }
+            if (!skip_tag(s, k - 3)) return kMtsrcTypeUnknown;
             window = 0;
             k = -1;
             continue;
         }
         // The candidate's three bytes are those before k.
         const int32_t answer = k < 3 ? 0 : try_candidate(*s, k - 3);
-        if (answer != 0) {
-            return answer;
-        }
+        if (answer != 0) return answer;
     }
     return kMtsrcTypeUnknown;
 }
@@ -159,29 +141,25 @@ bool has_transport_sync(const mtsrc_io *io, mtsrc_file *file) {
     return io->seek(file, &offset) == 0 && io->read(file, &byte, 1) == 1 && byte == kTransportSync;
 }
 
-// A stream of another kind, by the head; the offset moves.
+// True for the head of another kind of stream. May move the file offset.
 bool is_other_container(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file,
                         const int64_t *start) {
     constexpr uint8_t kPackHeader[4] = {0, 0, 1, 0xBA};
     if (head[0] == kTransportSync && (has_transport_sync(io, file) || io->seek(file, start) != 0)) {
         return true;
     }
-    return memcmp(head, kPackHeader, sizeof(kPackHeader)) == 0;
+    return memcmp(head, kPackHeader, sizeof kPackHeader) == 0;
 }
 
 }  // namespace
 
 int32_t mtsrc_probe_mpeg(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file) {
     int64_t start = 0;
-    if (io->tell(file, &start) != 0 || memcmp(head, "OggS", 4) == 0) {
-        return kMtsrcTypeUnknown;
-    }
+    if (io->tell(file, &start) != 0 || memcmp(head, "OggS", 4) == 0) return kMtsrcTypeUnknown;
     int32_t answer = kMtsrcTypeUnknown;
     if (!is_other_container(head, io, file, &start)) {
         scan s = {io, file, static_cast<uint8_t *>(malloc(kScanBytes)), 0};
-        if (s.buf) {
-            answer = run_scan(&s);
-        }
+        if (s.buf != nullptr) answer = run_scan(&s);
         free(s.buf);
     }
     io->seek(file, &start);

@@ -1,6 +1,7 @@
 #include <cstring>
 
 #include "common/limits.h"
+#include "core/tavo.h"
 #include "media_source/id3v2.h"
 #include "media_source/mtsrc.h"
 
@@ -8,7 +9,7 @@ namespace {
 
 using probe = int32_t (*)(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 
-// Cheap looks at the head first, the scan of a large block last.
+// In the order of their calls: cheap tests of the head first, the scan of a large block last.
 constexpr probe kProbes[] = {mtsrc_probe_asf, mtsrc_probe_mp4, mtsrc_probe_flac, mtsrc_probe_ogg,
                              mtsrc_probe_wav, mtsrc_probe_aac, mtsrc_probe_mpeg};
 
@@ -16,14 +17,12 @@ bool is_at(const uint8_t *head, size_t at, const char *name) {
     return memcmp(head + at, name, 4) == 0;
 }
 
-// Reads the first count bytes behind an ID3v2 tag, or at the current offset without one, and goes
-// back.
+// Reads count bytes behind an ID3v2 tag, or at the current offset without one, and restores the
+// offset.
 bool peek_behind_tag(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file, uint8_t *bytes,
                      int32_t count) {
     int64_t start = 0;
-    if (io->tell(file, &start) != 0) {
-        return false;
-    }
+    if (io->tell(file, &start) != 0) return false;
     bool found = true;
     if (memcmp(head, "ID3", 3) == 0) {
         int64_t length = id3v2_length(head);
@@ -41,17 +40,15 @@ int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type)
     uint8_t head[kHeadBytes] = {};
     if (io->tell(file, &start) != 0 || io->read(file, head, kHeadBytes) != kHeadBytes ||
         io->seek(file, &start) != 0) {
-        return -6;
+        return TAVO_ERR_READ;
     }
     int32_t answer = kMtsrcTypeUnknown;
-    for (const probe ask : kProbes) {
-        answer = ask(head, io, file);
-        if (answer != kMtsrcTypeUnknown) {
-            break;
-        }
+    for (const probe recognise : kProbes) {
+        answer = recognise(head, io, file);
+        if (answer != kMtsrcTypeUnknown) break;
     }
     *type = answer;
-    return 0;
+    return TAVO_OK;
 }
 
 int32_t mtsrc_probe_asf(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file * /*file*/) {
@@ -68,7 +65,7 @@ int32_t mtsrc_probe_mp4(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file
 int32_t mtsrc_probe_flac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file) {
     uint8_t bytes[4];
     const bool is_flac =
-        peek_behind_tag(head, io, file, bytes, sizeof(bytes)) && is_at(bytes, 0, "fLaC");
+        peek_behind_tag(head, io, file, bytes, sizeof bytes) && is_at(bytes, 0, "fLaC");
     return is_flac ? kMtsrcTypeFlac : kMtsrcTypeUnknown;
 }
 
@@ -76,7 +73,7 @@ int32_t mtsrc_probe_ogg(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file
     constexpr uint8_t kMaxHeaderFlags = 6;
     constexpr uint8_t kFirstPosition[8] = {};
     const bool is_ogg = is_at(head, 0, "OggS") && head[4] == 0 && head[5] <= kMaxHeaderFlags &&
-                        memcmp(head + 6, kFirstPosition, sizeof(kFirstPosition)) == 0;
+                        memcmp(head + 6, kFirstPosition, sizeof kFirstPosition) == 0;
     return is_ogg ? kMtsrcTypeOgg : kMtsrcTypeUnknown;
 }
 
@@ -87,12 +84,8 @@ int32_t mtsrc_probe_wav(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file
 
 int32_t mtsrc_probe_aac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file) {
     uint8_t bytes[7];
-    if (!peek_behind_tag(head, io, file, bytes, sizeof(bytes))) {
-        return kMtsrcTypeUnknown;
-    }
-    if (is_at(bytes, 0, "ADIF")) {
-        return kMtsrcTypeAac;
-    }
+    if (!peek_behind_tag(head, io, file, bytes, sizeof bytes)) return kMtsrcTypeUnknown;
+    if (is_at(bytes, 0, "ADIF")) return kMtsrcTypeAac;
     // The ADTS sync word with layer 0: either MPEG version, with or without a checksum.
     switch (bytes[0] << 8 | bytes[1]) {
         case 0xFFF0:

@@ -1,3 +1,4 @@
+// RIFF WAVE with 16-bit PCM: a reader without a decoder.
 #include "common/tavo_ctx.h"
 #include "media_source/codec_source.h"
 #include "media_source/pcm_queue.h"
@@ -12,41 +13,29 @@ int32_t fill_step(mtsrc_ctx *src, uint8_t *chunk, void * /*work*/) {
     int64_t second = 0;
     const int32_t result =
         xwavd_get_frm(src->demux, chunk, src->frm_buf_size, &bytes, &first, &second);
-    if (result != 0) {
-        return result == 1 ? 1 : -6;
-    }
-    if (bytes < 0 || bytes > src->frm_buf_size) {
-        return -6;
-    }
+    if (result == kWexaEndOfStream) return kMtsrcEndOfStream;
+    if (result != 0) return TAVO_ERR_READ;
+    if (bytes < 0 || bytes > src->frm_buf_size) return TAVO_ERR_READ;
     pcm_queue_push(src, pcm_first_channel(src->q_wr, chunk, bytes, src->format.channels));
-    return 0;
+    return TAVO_OK;
 }
 
 }  // namespace
 
 int32_t mtsource_wav_open(mtsrc_ctx *src) {
-    if (!src) {
-        return -4;
-    }
-    if (!src->probe_file) {
-        return -7;
-    }
+    if (src == nullptr) return TAVO_ERR_HANDLE;
+    if (src->probe_file == nullptr) return TAVO_ERR_OPEN;
     src->decoder = nullptr;
     src->demux = nullptr;
     xwav_info info = {};
     int32_t word = 0;
     void *reader = xwavd_create(&src->io, &info, &word);
-    // Before the reader is looked at: none and an empty record is a matter of format, not of
-    // access.
+    // Tested before the reader: none with an empty record is a matter of format, not of access.
     if (info.codec != kWexaPcm || info.bits != kBitsPerSample) {
-        if (reader) {
-            xwavd_delete(reader);
-        }
-        return -3;
+        if (reader != nullptr) xwavd_delete(reader);
+        return TAVO_ERR_FORMAT;
     }
-    if (!reader) {
-        return -7;
-    }
+    if (reader == nullptr) return TAVO_ERR_OPEN;
     src->demux = reader;
     src->frm_buf_size = kChunkBytes;
     src->codec = kMtsrcTypeWav;
@@ -54,38 +43,32 @@ int32_t mtsource_wav_open(mtsrc_ctx *src) {
     if (info.sample_rate > kMaxRate || info.channels <= 0) {
         xwavd_delete(reader);
         src->demux = nullptr;
-        return -3;
+        return TAVO_ERR_FORMAT;
     }
-    return 0;
+    return TAVO_OK;
 }
 
 void mtsource_wav_close(mtsrc_ctx *src) {
-    if (src && src->demux) {
+    if (src != nullptr && src->demux != nullptr) {
         xwavd_delete(src->demux);
         src->demux = nullptr;
     }
 }
 
 int32_t mtsource_wav_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
-    if (!src) {
-        return -4;
-    }
+    if (src == nullptr) return TAVO_ERR_HANDLE;
     return pcm_queue_get(src, want, frame, {fill_step, nullptr});
 }
 
 int32_t mtsource_wav_seek(mtsrc_ctx *src, int64_t position, int64_t *reached) {
-    if (!src) {
-        return -4;
-    }
+    if (src == nullptr) return TAVO_ERR_HANDLE;
     pcm_queue_clear(src);
     int64_t seconds = position / kUnitsPerSecond;
-    return xwavd_seek(src->demux, &seconds, reached, 0) == 0 ? 0 : -4;
+    return xwavd_seek(src->demux, &seconds, reached, 0) == 0 ? TAVO_OK : TAVO_ERR_HANDLE;
 }
 
 int32_t mtsource_wav_reset(mtsrc_ctx *src) {
-    if (!src) {
-        return -4;
-    }
+    if (src == nullptr) return TAVO_ERR_HANDLE;
     pcm_queue_clear(src);
-    return 0;
+    return TAVO_OK;
 }

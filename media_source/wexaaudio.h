@@ -1,9 +1,10 @@
-// The interface of the codec library, libwexaaudio.so: readers, demuxers and frame decoders. The
-// records are read by another binary, so each offset is asserted.
+// The contract that a codec library, libwexaaudio.so, fulfils for the format sources of stage 1:
+// readers, demuxers and frame decoders. It is the contract, not an implementation. The records are
+// read by another binary, so each offset is asserted.
 //
-// Every reader opens the file itself through the callbacks of mtsrc_io. Results: 0 success, 1 end
-// of stream, anything else failure. Times are in 100-ns units unless said otherwise. Objects of
-// different sources are used on different threads at once and share nothing.
+// Every reader opens the file itself through the callbacks of mtsrc_io. Results: 0 success,
+// kWexaEndOfStream, anything else failure. Times are in 100-ns units unless said otherwise. Objects
+// of different sources are used on different threads at once and share nothing.
 #ifndef TAVO_MEDIA_SOURCE_WEXAAUDIO_H
 #define TAVO_MEDIA_SOURCE_WEXAAUDIO_H
 
@@ -21,7 +22,8 @@ constexpr int32_t kWexaEndOfStream = 1;  // result of a read
 // duration and positions count what the source delivers.
 constexpr int32_t kWexaMpegDelay = 529;
 
-// Tags of a file. The record is the library's; the buffers are malloc'ed and the source's to free.
+// Tags of a file; a reader may give none (a null pointer). The record is the library's. The buffers
+// are allocated with malloc; the source frees them unread.
 struct wexa_tag_text {
     uint64_t reserved_0;
     void *data;
@@ -195,7 +197,7 @@ constexpr size_t kFlacReaderFlag = 2096;
 
 extern "C" {
 
-// WAV: chunks of interleaved PCM; positions in whole seconds in, 100-ns units out.
+// WAV: chunks of interleaved PCM. seek takes whole seconds and stores 100-ns units.
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t *word);
 int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                       int64_t *second);

@@ -6,8 +6,6 @@
 
 namespace {
 
-constexpr int32_t kEndOfStream = 1;
-
 // Replies without a byte, in a row, after which a source is given up. No stream brings as many.
 constexpr int32_t kMaxEmptyReplies = 65'536;
 
@@ -30,7 +28,7 @@ int64_t read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity) {
         const int32_t delivered = std::clamp(frame.size, 0, want);
         got += delivered;
         empty_replies = delivered > 0 ? 0 : empty_replies + 1;
-        if (result == kEndOfStream) break;
+        if (result == kMtsrcEndOfStream) break;
     }
     return got;
 }

@@ -1,0 +1,17 @@
+// Stage 1, behind codec_source.h: the two codecs that occur both bare and in MP4.
+//
+// In: the stream as its reader or its track describes it. Out: a decoder in the handle.
+#ifndef TAVO_MEDIA_SOURCE_CODECS_H
+#define TAVO_MEDIA_SOURCE_CODECS_H
+
+#include "media_source/codec_source.h"
+
+extern const codec_ops kAacCodec;
+extern const codec_ops kMpegCodec;
+
+// Creates the decoder. sample_rate: Hz; duration: 100-ns units. Returns 0; TAVO_ERR_CODEC no
+// decoder, TAVO_ERR_FORMAT a rate that is not accepted or, for MPEG, no channels.
+int32_t use_aac_codec(mtsrc_ctx *src, int32_t sample_rate, int32_t channels, int64_t duration);
+int32_t use_mpeg_codec(mtsrc_ctx *src, int32_t sample_rate, int32_t channels, int64_t duration);
+
+#endif
