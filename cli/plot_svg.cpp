@@ -7,52 +7,67 @@
 #include "cli/plot.h"
 #include "cli/svg.h"
 #include "cli/words.h"
+#include "highlight/search.h"
 
 namespace {
 
-// Pixels of the picture. From top to bottom: name, facts, the highlight's label, waveform,
-// loudness, beats, time axis.
+// Units of the picture's view box, three to a pixel where it is shown 400 pixels wide. From top to
+// bottom: name, facts, the highlight's label, then a title and a lane each for waveform, loudness
+// and beats, the time axis.
 constexpr int kWidth = 1200;
-constexpr int kHeight = 400;
-constexpr double kLeft = 112.5;  // of the time axis; lines of one pixel lie on half pixels
+constexpr int kHeight = 624;
+constexpr double kLeft = 132.0;  // of the time axis
 constexpr double kRight = kLeft + kPlotColumns;
-constexpr double kMargin = 16.0;  // where the lanes' names start
-constexpr double kNameY = 25.0;
-constexpr double kFactsY = 46.0;
-constexpr double kLabelY = 70.0;
-constexpr double kMarkY = 76.0;  // top of the highlight's triangle
+constexpr double kMargin = 16.0;  // left and right of the text at the top
+constexpr double kNameY = 42.0;
+constexpr double kFactsY = 80.0;
+constexpr double kLabelY = 126.0;
+constexpr double kMarkY = 136.0;  // top of the highlight's triangle
 
 struct lane {
+    double title;  // baseline of its text
     double top;
     double bottom;
 };
-constexpr lane kWaveform = {86.0, 202.0};
-constexpr lane kLoudness = {214.0, 322.0};
-constexpr lane kLoudnessAlone = {214.0, 358.0};  // without beats
-constexpr lane kBeats = {332.0, 358.0};
-constexpr double kAxisY = 362.5;
-constexpr double kAxisLabelY = 383.0;
+constexpr lane kWaveform = {182.0, 194.0, 326.0};
+constexpr lane kLoudness = {366.0, 378.0, 488.0};
+constexpr lane kLoudnessAlone = {366.0, 378.0, 574.0};  // without beats
+constexpr lane kBeats = {528.0, 540.0, 574.0};
+constexpr double kAxisY = 580.0;
+constexpr double kAxisLabelY = 614.0;
 
 constexpr double kNameWidth = kWidth - 2 * kMargin;
-constexpr double kTickSpace = 80.0;  // least distance of labels on the time axis
-constexpr double kBeatSpace = 2.0;   // beats closer than that on average are stacked
-constexpr double kStackWidth = 4.0;  // of a stack, with its gap
-constexpr double kCharacter = 8.0;   // a generous width at kFont, in any sans-serif font
-constexpr double kFont = 13.0;       // pixels
-constexpr double kNameFont = 16.0;
-constexpr double kSkewMs = 1000.0;  // stated and read lengths that differ more are both told
+constexpr double kTickSpace = 150.0;  // least distance of labels on the time axis
+constexpr double kBeatSpace = 4.0;    // beats closer than that on average are stacked
+constexpr double kStackWidth = 6.0;   // of a stack, with its gap
+constexpr double kFont = 27.0;
+constexpr double kNameFont = 34.0;
+constexpr double kCharacter = 0.615;  // a generous width in any sans-serif font, in font sizes
+constexpr double kSkewMs = 1000.0;    // stated and read lengths that differ more are both told
 constexpr double kHourMs = 3.6e6;
 constexpr double kFullScale = 32768.0;
+constexpr double kPointMs = 2000.0;   // from one loudness value to the next
+constexpr double kWindowMs = 6000.0;  // that a loudness value is about
 
-// Okabe and Ito's colours, which differ in lightness too.
+// Okabe and Ito's colours, which differ in lightness too. kDark replaces some where the viewer
+// prefers a dark ground; a viewer that knows no style sheets shows the light picture.
+constexpr const char *kGroundColour = "#FFFFFF";
+constexpr const char *kInkColour = "#000000";
 constexpr const char *kWaveformColour = "#999999";
 constexpr const char *kLoudnessColour = "#0072B2";
 constexpr const char *kHighlightColour = "#D55E00";
 constexpr const char *kRegionColour = "#E69F00";
-constexpr const char *kBeatColour = "#000000";
 constexpr const char *kGridColour = "#DDDDDD";
+constexpr const char *kUnsearchedColour = "#EEEEEE";
+constexpr const char *kDark =
+    "<style>@media (prefers-color-scheme: dark) {\n"
+    "svg { fill: #EEEEEE } #ground { fill: #181818 } #unsearched { fill: #303030 }\n"
+    "#grid, #scale { stroke: #484848 } #waveform { fill: #8A8A8A; stroke: #8A8A8A }\n"
+    "#loudness { stroke: #56B4E9 } circle#loudness { fill: #56B4E9 }\n"
+    "#mean-edge { stroke: #181818 } #axis, #beats, #mean { stroke: #EEEEEE }\n"
+    "}</style>\n";
 
-// As much of a name as fits, at 16 pixels and bold: other scripts' characters are up to as wide as
+// As much of a name as fits, at kNameFont and bold: other scripts' characters are up to as wide as
 // high.
 std::string fitting(const std::string &bytes, double width) {
     std::string text = as_utf8(bytes);
@@ -60,7 +75,7 @@ std::string fitting(const std::string &bytes, double width) {
     for (size_t i = 0; i < text.size(); ++i) {
         const auto c = static_cast<unsigned char>(text[i]);
         if ((c & 0xC0) == 0x80) continue;
-        used += c < 0x80 ? 11.0 : 17.0;
+        used += kNameFont * (c < 0x80 ? 0.69 : 1.06);
         if (used > width) return text.substr(0, i) + "\xE2\x80\xA6";
     }
     return text;
@@ -79,20 +94,33 @@ std::string highlight_words(const record &result) {
     return words;
 }
 
-std::string facts(const record &result, const plot_data &data) {
+std::string stream_words(const record &result, const plot_data &data) {
     std::string words = clock_text(static_cast<double>(result.duration_ms));
     if (std::fabs(data.read_ms - static_cast<double>(result.duration_ms)) > kSkewMs) {
         words += " (" + clock_text(data.read_ms) + " could be read)";
     }
-    words += ", " + std::to_string(result.sample_rate) + " Hz, " + std::to_string(result.channels) +
-             (result.channels == 1 ? " channel" : " channels");
+    return words + ", " + std::to_string(result.sample_rate) + " Hz, " +
+           count_text(static_cast<size_t>(result.channels), "channel");
+}
+
+std::string beat_words(const record &result) {
+    return count_text(result.beats_ms.size(), "beat") +
+           (result.has_highlight ? " from the highlight on, " : ", ") + std::to_string(result.bpm) +
+           " BPM";
+}
+
+std::string description(const record &result, const plot_data &data) {
+    std::string words = stream_words(result, data);
     if (result.has_highlight) words += ", " + highlight_words(result);
     if (result.has_beats) {
         words += ", " + std::to_string(result.bpm) + " BPM, " +
-                 std::to_string(result.beats_ms.size()) +
-                 (result.beats_ms.size() == 1 ? " beat" : " beats");
+                 count_text(result.beats_ms.size(), "beat");
     }
     return words;
+}
+
+double width_of(const std::string &words) {
+    return kCharacter * kFont * static_cast<double>(words.size());
 }
 
 std::string head(const record &result, const plot_data &data) {
@@ -106,17 +134,49 @@ std::string head(const record &result, const plot_data &data) {
                                 {"viewBox", "0 0 " + width + " " + height},
                                 {"font-family", "sans-serif"},
                                 {"font-size", decimal(kFont, 0)},
-                                {"fill", "#000000"}};
+                                {"fill", kInkColour}};
     const attributes bold = {{"x", decimal(kMargin, 1)},
                              {"y", decimal(kNameY, 1)},
                              {"font-size", decimal(kNameFont, 0)},
                              {"font-weight", "bold"},
                              {"xml:space", "preserve"}};
+    const attributes ground = {
+        {"id", "ground"}, {"width", width}, {"height", height}, {"fill", kGroundColour}};
     return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n" + opened("svg", picture) + ">\n<title>" +
-           xml(name) + "</title>\n<desc>" + facts(result, data) + "</desc>\n" +
-           element("rect", {{"width", width}, {"height", height}, {"fill", "#FFFFFF"}}) +
-           opened("text", bold) + ">" + xml(fitting(name, kNameWidth)) + "</text>\n" +
-           text_at(kMargin, kFactsY, "start", facts(result, data));
+           xml(name) + "</title>\n<desc>" + description(result, data) + "</desc>\n" + kDark +
+           element("rect", ground) + opened("text", bold) + ">" + xml(fitting(name, kNameWidth)) +
+           "</text>\n" + text_at(kMargin, kFactsY, "start", stream_words(result, data));
+}
+
+// The title of a lane stands at the end of the lane where the highlight's line does not cross it.
+std::string lane_title(const record &result, const plot_data &data, const lane &of,
+                       const std::string &words) {
+    const bool crossed =
+        result.has_highlight && x_of(data, result.hl_pos_ms) < kLeft + width_of(words);
+    return text_at(crossed ? kRight : kLeft, of.title, crossed ? "end" : "start", words);
+}
+
+// Shades the start and the end of the song, where no rise counts as the entry of a highlight. The
+// last window that is looked at may hold a rise at its very end.
+std::string unsearched(const record &result, const plot_data &data) {
+    if (!result.has_highlight || data.loudness.empty()) return "";
+    const bool is_short = result.duration_ms / 1000 < kShortSongSeconds;
+    const double tail = is_short ? kShortSearchTail : kSearchTail;
+    const double from = is_short ? 0.0 : kSearchSkip * kPointMs;
+    const double last = static_cast<double>(data.loudness.size()) - tail;
+    const double to = last < 0.0 ? from : std::max(from, last * kPointMs + kWindowMs);
+    const auto box = [&](double start_ms, double end_ms) {
+        const double start = x_of(data, start_ms);
+        return "M" + point(start, kMarkY) + "H" + decimal(x_of(data, end_ms), 1) + "V" +
+               decimal(kAxisY, 1) + "H" + decimal(start, 1) + "Z";
+    };
+    const std::string words = "not searched";
+    const double mark = x_of(data, result.hl_pos_ms);
+    const double room_from = std::max(x_of(data, to), mark + width_of(highlight_words(result)));
+    return element("path", {{"id", "unsearched"},
+                            {"fill", kUnsearchedColour},
+                            {"d", box(0.0, from) + box(to, data.length_ms)}}) +
+           (kRight - room_from > width_of(words) ? text_at(kRight, kLabelY, "end", words) : "");
 }
 
 // Milliseconds between labels of the time axis.
@@ -144,23 +204,25 @@ std::string tick_label(double ms, double step, double length_ms) {
     return text.data();
 }
 
-std::string time_axis(const plot_data &data) {
+std::string time_axis(const record &result, const plot_data &data) {
     const double step = tick_step(data.length_ms);
+    const lane &loudness = result.has_beats ? kLoudness : kLoudnessAlone;
     std::string grid;
     std::string ticks = "M" + point(kLeft, kAxisY) + "H" + decimal(kRight, 1);
     std::string labels;
     for (int k = 0; k * step <= data.length_ms; ++k) {
         const double x = x_of(data, k * step);
-        grid += "M" + point(x, kWaveform.top) + "V" + decimal(kAxisY, 1);
-        ticks += "M" + point(x, kAxisY) + "v5";
+        for (const lane &in : {kWaveform, loudness}) {
+            grid += "M" + point(x, in.top) + "V" + decimal(in.bottom, 1);
+        }
+        ticks += "M" + point(x, kAxisY) + "v8";
         labels += text_at(x, kAxisLabelY, "middle", tick_label(k * step, step, data.length_ms));
     }
-    return stroke("grid", kGridColour, 1, grid) + stroke("axis", "#000000", 1, ticks) +
-           "<g id=\"times\">\n" + labels + "</g>\n" +
-           text_at(kMargin, kAxisLabelY, "start", data.length_ms < kHourMs ? "min:s" : "h:min:s");
+    return stroke("grid", kGridColour, 2, grid) + stroke("axis", kInkColour, 2, ticks) +
+           "<g id=\"times\">\n" + labels + "</g>\n";
 }
 
-std::string waveform(const plot_data &data) {
+std::string waveform(const record &result, const plot_data &data) {
     const double middle = (kWaveform.top + kWaveform.bottom) / 2;
     const double scale = (kWaveform.bottom - kWaveform.top) / 2 / std::max(data.peak, 1);
     const auto x = [](size_t column) { return kLeft + 0.5 + static_cast<double>(column); };
@@ -176,17 +238,24 @@ std::string waveform(const plot_data &data) {
     return element("path", {{"id", "waveform"},
                             {"fill", kWaveformColour},
                             {"stroke", kWaveformColour},  // keeps silence visible
-                            {"stroke-width", "0.8"},
+                            {"stroke-width", "1.5"},
                             {"stroke-linejoin", "round"},
                             {"d", path + "Z"}}) +
-           text_at(kMargin, middle - 3, "start", "waveform") +
-           text_at(kMargin, middle + 14, "start",
-                   "peak " + decimal(percent, percent < 9.95 ? 1 : 0) + " %");
+           lane_title(result, data, kWaveform,
+                      "waveform, peak " + decimal(percent, percent < 9.95 ? 1 : 0) + " %");
 }
 
 // A value stands in the middle of the 6 s that it is about.
 double middle_ms(size_t index) {
-    return 2000.0 * static_cast<double>(index) + 3000.0;
+    return kPointMs * static_cast<double>(index) + kWindowMs / 2;
+}
+
+// A value of the curve as the level that music has there: below full scale, of the mean square.
+std::string level_text(double value) {
+    const double mean_square = std::pow(10.0, value / 10.0) - 1.0;
+    if (mean_square <= 0.0) return "silence";
+    const double level = 10.0 * std::log10(mean_square);
+    return level > -0.05 ? "0 dB" : decimal(level, level > -9.95 ? 1 : 0) + " dB";
 }
 
 // More values than a thick line could show; the mean's line needs a light edge then.
@@ -202,29 +271,20 @@ std::string loudness_line(const plot_data &data, const lane &in, double scale) {
         return element("circle", {{"id", "loudness"},
                                   {"cx", decimal(x_of(data, middle_ms(0)), 1)},
                                   {"cy", decimal(y(0), 1)},
-                                  {"r", "4"},
+                                  {"r", "7"},
                                   {"fill", kLoudnessColour}});
     }
     std::string path;
     for (size_t k = 0; k < data.loudness.size(); ++k) {
         path += (k == 0 ? "M" : "L") + point(x_of(data, middle_ms(k)), y(k));
     }
-    return stroke("loudness", kLoudnessColour, is_dense(data) ? 1 : 2, path);
+    return stroke("loudness", kLoudnessColour, is_dense(data) ? 1.5 : 4, path);
 }
 
-std::string loudness(const plot_data &data, const lane &in) {
-    const double middle = (in.top + in.bottom) / 2;
-    const std::string name = text_at(kMargin, middle + 5, "start", "loudness");
+std::string loudness(const record &result, const plot_data &data) {
+    const lane &in = result.has_beats ? kLoudness : kLoudnessAlone;
     if (data.loudness.empty()) {
-        const std::string words = "none: less than 6 s";
-        const double width = kCharacter * static_cast<double>(words.size());
-        return name +
-               element("rect", {{"x", decimal((kLeft + kRight - width) / 2, 1)},
-                                {"y", decimal(middle - 10, 1)},
-                                {"width", decimal(width, 1)},
-                                {"height", "20"},
-                                {"fill", "#FFFFFF"}}) +
-               text_at((kLeft + kRight) / 2, middle + 5, "middle", words);
+        return lane_title(result, data, in, "loudness: none, less than 6 s");
     }
     const double top =
         static_cast<double>(*std::max_element(data.loudness.begin(), data.loudness.end()));
@@ -232,14 +292,13 @@ std::string loudness(const plot_data &data, const lane &in) {
     const double mean_y = in.bottom - data.mean * scale;
     const std::string frame = "M" + point(kLeft, in.top) + "H" + decimal(kRight, 1) + "M" +
                               point(kLeft, in.bottom) + "H" + decimal(kRight, 1);
-    return name + stroke("scale", kGridColour, 1, frame) + loudness_line(data, in, scale) +
-           (is_dense(data)
-                ? element("line", line(kLeft, mean_y, kRight, mean_y, "#FFFFFF", 3, "none"))
-                : "") +
-           named_line("mean", line(kLeft, mean_y, kRight, mean_y, "#000000", 1, "7 4")) +
-           text_at(kRight + 6, mean_y + 4.5, "start", "mean " + decimal(data.mean, 2)) +
-           text_at(kLeft - 6, in.top + 9, "end", decimal(top, 2)) +
-           text_at(kLeft - 6, in.bottom, "end", "0");
+    attributes edge = line(kLeft, mean_y, kRight, mean_y, kGroundColour, 5, "none");
+    return lane_title(result, data, in, "loudness, mean " + level_text(data.mean)) +
+           stroke("scale", kGridColour, 2, frame) + loudness_line(data, in, scale) +
+           (is_dense(data) ? named_line("mean-edge", edge) : "") +
+           named_line("mean", line(kLeft, mean_y, kRight, mean_y, kInkColour, 2, "14 8")) +
+           (top > 0.0 ? text_at(kLeft - 8, in.top + 20, "end", level_text(top)) : "") +
+           text_at(kLeft - 8, in.bottom, "end", level_text(0.0));
 }
 
 std::string region(const record &result, const plot_data &data) {
@@ -248,13 +307,12 @@ std::string region(const record &result, const plot_data &data) {
     const double end = x_of(data, result.hl_pos_ms + 1000.0 * result.length_s);
     return element("rect", {{"id", "region"},
                             {"x", decimal(start, 2)},
-                            {"y", decimal(kWaveform.top, 1)},
+                            {"y", decimal(kMarkY, 1)},
                             {"width", decimal(end - start, 2)},
-                            {"height", decimal(kAxisY - kWaveform.top, 1)},
+                            {"height", decimal(kAxisY - kMarkY, 1)},
                             {"fill", kRegionColour},
                             {"fill-opacity", "0.25"}}) +
-           named_line("region-end",
-                      line(end, kWaveform.top, end, kAxisY, kHighlightColour, 2, "2 4"));
+           named_line("region-end", line(end, kMarkY, end, kAxisY, kHighlightColour, 4, "4 6"));
 }
 
 // The label stands at the side of the mark where there is room.
@@ -262,11 +320,11 @@ std::string highlight(const record &result, const plot_data &data) {
     if (!result.has_highlight) return "";
     const double x = x_of(data, result.hl_pos_ms);
     const std::string words = highlight_words(result);
-    const bool left = x + kCharacter * static_cast<double>(words.size()) > kWidth - kMargin;
-    return named_line("highlight", line(x, kMarkY, x, kAxisY, kHighlightColour, 2, "none")) +
-           element("path",
-                   {{"fill", kHighlightColour}, {"d", "M" + point(x - 6, kMarkY) + "h12l-6 10Z"}}) +
-           text_at(left ? x + 6 : x - 6, kLabelY, left ? "end" : "start", words);
+    const bool left = x + width_of(words) > kWidth - kMargin;
+    return named_line("highlight", line(x, kMarkY, x, kAxisY, kHighlightColour, 4, "none")) +
+           element("path", {{"fill", kHighlightColour},
+                            {"d", "M" + point(x - 11, kMarkY) + "h22l-11 18Z"}}) +
+           text_at(left ? x + 11 : x - 11, kLabelY, left ? "end" : "start", words);
 }
 
 // How many beats each stack of kStackWidth pixels holds.
@@ -302,31 +360,28 @@ bool too_close(const record &result, const plot_data &data) {
 
 std::string beats(const record &result, const plot_data &data) {
     if (!result.has_beats) return "";
-    const double first_line = kBeats.top + 9;
-    const double second_line = kBeats.top + 25;
-    const std::string names =
-        text_at(kMargin, first_line, "start", "beats") +
-        text_at(kMargin, second_line, "start", std::to_string(result.bpm) + " BPM");
     if (too_close(result, data)) {
         const std::vector<int> heights = stack_heights(result, data);
         const int most = *std::max_element(heights.begin(), heights.end());
         const double seconds = data.length_ms / 1000.0 * kStackWidth / kPlotColumns;
-        return stroke("beats", kBeatColour, kStackWidth - 1, stacked_ticks(heights, most)) + names +
-               text_at(kRight + 6, first_line, "start", "most: " + std::to_string(most)) +
-               text_at(kRight + 6, second_line, "start", "in " + decimal(seconds, 1) + " s");
+        return stroke("beats", kInkColour, kStackWidth - 2, stacked_ticks(heights, most)) +
+               lane_title(result, data, kBeats,
+                          beat_words(result) + ", at most " + std::to_string(most) + " in " +
+                              decimal(seconds, 1) + " s");
     }
     std::string path;
     for (const float beat : result.beats_ms) {
         path += "M" + decimal(x_of(data, static_cast<double>(beat)), 2) + " " +
                 decimal(kBeats.top, 1) + "V" + decimal(kBeats.bottom, 1);
     }
-    return stroke("beats", kBeatColour, 1, path) + names;
+    return stroke("beats", kInkColour, 2, path) +
+           lane_title(result, data, kBeats, beat_words(result));
 }
 
 }  // namespace
 
 std::string plot_svg(const record &result, const plot_data &data) {
-    return head(result, data) + region(result, data) + time_axis(data) + waveform(data) +
-           loudness(data, result.has_beats ? kLoudness : kLoudnessAlone) + beats(result, data) +
-           highlight(result, data) + "</svg>\n";
+    return head(result, data) + unsearched(result, data) + region(result, data) +
+           time_axis(result, data) + waveform(result, data) + loudness(result, data) +
+           beats(result, data) + highlight(result, data) + "</svg>\n";
 }

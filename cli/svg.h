@@ -1,5 +1,5 @@
-// Elements of SVG as text, for plot_svg.cpp. Attributes alone, no style sheets and no fonts of its
-// own: every viewer shows the same.
+// Elements of SVG as text, for plot_svg.cpp. Attributes alone: every viewer shows the same,
+// whatever it makes of the style sheet for dark grounds that plot_svg.cpp adds.
 #ifndef TAVO_CLI_SVG_H
 #define TAVO_CLI_SVG_H
 

@@ -11,10 +11,6 @@
 
 namespace {
 
-constexpr int32_t kShortSong = 90;  // seconds; from here on the wider margins hold
-constexpr int32_t kSkip = 9;        // envelope points at the start where no edge is sought
-constexpr int32_t kTail = 25;       // points at the end where no edge is scored
-constexpr int32_t kShortTail = 10;
 constexpr int32_t kMinPoints = 4;     // a song needs more beyond the skip
 constexpr int32_t kMinSegment = 3;    // points of a loud segment
 constexpr int32_t kMinLoudAfter = 4;  // points that a segment must hold on after an edge
@@ -174,8 +170,8 @@ uint32_t search_envelope(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm,
     s.norm = norm;
     s.diff = diff;
     s.n = hl->power_count;
-    s.skip = duration_s < kShortSong ? 0 : kSkip;
-    s.tail = duration_s < kShortSong ? kShortTail : kTail;
+    s.skip = duration_s < kShortSongSeconds ? 0 : kSearchSkip;
+    s.tail = duration_s < kShortSongSeconds ? kShortSearchTail : kSearchTail;
     if (s.n - s.skip <= kMinPoints) return 0;
 
     float largest = 0.0f;

@@ -7,6 +7,12 @@
 
 #include "common/tavo_ctx.h"
 
+// Envelope points (2 s each) at the song's start and end where no rise is looked for.
+constexpr int32_t kShortSongSeconds = 90;  // seconds; from here on the wider margins hold
+constexpr int32_t kSearchSkip = 9;         // no edge is sought before this point; 0 in a short song
+constexpr int32_t kSearchTail = 25;        // no edge is scored within this many points of the end
+constexpr int32_t kShortSearchTail = 10;
+
 extern "C" {
 
 // duration_s: the song's length, whole seconds. Returns milliseconds; 0 when nothing is found.

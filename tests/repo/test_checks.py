@@ -47,7 +47,8 @@ class Includes(unittest.TestCase):
             ("cli/a.cpp", "media_source/mtsrc.h", 0),
             ("cli/a.cpp", "media_source/mtsrc_ctx.h", 1),
             ("cli/a.cpp", "highlight/power_envelope.h", 0),
-            ("cli/a.cpp", "highlight/search.h", 1),
+            ("cli/a.cpp", "highlight/search.h", 0),
+            ("cli/a.cpp", "highlight/region.h", 1),
             ("desktop/wexaaudio/a.cpp", "media_source/mtsrc_ctx.h", 1),
         ]
         for source, target, expected in cases:
