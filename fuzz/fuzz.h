@@ -1,62 +1,56 @@
-// What the fuzzers share: taking an input apart, and saying what must hold.
+// What the fuzzers share. Each program takes bytes, brings them into the reach of what a caller of
+// its functions guarantees, and aborts when a result breaks what is promised. Choices are taken
+// from an input's end, so that an audio file as it is can be an input.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 
-#include <cstddef>
-#include <cstdint>
+#include <fuzzer/FuzzedDataProvider.h>
+
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <vector>
 
 namespace fuzz {
 
+using input = FuzzedDataProvider;
+
 // Ends the program when holds is false: libFuzzer keeps the input and names it.
-inline void must(bool holds, const char *what) {
+inline void must(bool holds, const char *promise) {
     if (holds) return;
-    fprintf(stderr, "fuzz: broken: %s\n", what);
+    fprintf(stderr, "fuzz: broken: %s\n", promise);
     abort();
 }
 
-// An input taken from its front. What lies behind its end reads as 0.
-struct input {
-    const uint8_t *at;
-    size_t left;
-
-    template <typename T>
-    T take() {
-        T value = {};
-        const size_t got = left < sizeof(T) ? left : sizeof(T);
-        memcpy(&value, at, got);
-        at += got;
-        left -= got;
-        return value;
+// At most count values, by one of three scales: small whole numbers, among them equal ones; 0 to 1;
+// any bits, among them infinities and NaN.
+template <typename T>
+std::vector<T> values(input *in, size_t count) {
+    const int scale = in->ConsumeIntegralInRange(0, 2);
+    std::vector<T> list(std::min(count, in->remaining_bytes() / (scale == 0 ? 1 : sizeof(T))));
+    for (T &value : list) {
+        if (scale == 0) value = static_cast<T>(in->ConsumeIntegral<int8_t>());
+        if (scale == 1) value = in->ConsumeProbability<T>();
+        if (scale == 2) in->ConsumeData(&value, sizeof(T));
     }
+    return list;
+}
 
-    // From lowest to highest, both included.
-    int32_t take_from(int32_t lowest, int32_t highest) {
-        const uint32_t span = static_cast<uint32_t>(highest) - static_cast<uint32_t>(lowest);
-        const uint32_t value = span < 256 ? take<uint8_t>() : take<uint32_t>();
-        return static_cast<int32_t>(static_cast<uint32_t>(lowest) +
-                                    (span == UINT32_MAX ? value : value % (span + 1)));
-    }
+// As values, but count of them, the rest zeros.
+template <typename T>
+std::vector<T> exactly(input *in, size_t count) {
+    std::vector<T> list = values<T>(in, count);
+    list.resize(count);
+    return list;
+}
 
-    // Fills values[count] by one of three scales, the first byte's choice: small whole numbers,
-    // among them equal ones; bytes as they come, among them infinities and what is no number; the
-    // usual ones among 0 to 1.
-    template <typename T>
-    void take_values(T *values, size_t count) {
-        const uint8_t scale = take<uint8_t>() % 3;
-        for (size_t i = 0; i < count; ++i) {
-            if (scale == 0) {
-                values[i] = static_cast<T>(take<int8_t>());
-            } else if (scale == 1) {
-                values[i] = take<T>();
-            } else {
-                values[i] = static_cast<T>(take<uint16_t>()) / static_cast<T>(65535);
-            }
-        }
-    }
-};
+// One of the functions, chosen by the input.
+template <size_t count>
+void run_one(void (*const (&functions)[count])(input *), const uint8_t *data, size_t size) {
+    input in(data, size);
+    functions[in.ConsumeIntegralInRange<size_t>(0, count - 1)](&in);
+}
 
 }  // namespace fuzz
 

@@ -1,0 +1,343 @@
+// The stages of the analysis: each against its plain form, or against what its result must be like.
+// Threads cannot be started here: bodies of workers run on the calling thread.
+#include <pthread.h>
+
+#include <cerrno>
+#include <memory>
+
+#include "beat/beat_ctx.h"
+#include "beat/beats.h"
+#include "beat/candidates.h"
+#include "beat/click_track.h"
+#include "beat/power_rise.h"
+#include "beat/tempo.h"
+#include "fuzz/fuzz.h"
+#include "highlight/position.h"
+#include "highlight/power_envelope.h"
+#include "highlight/region.h"
+#include "highlight/search.h"
+#include "pcm/resample.h"
+#include "tests/support/reference.h"
+
+extern "C" int __wrap_pthread_create(pthread_t *, const pthread_attr_t *, void *(*)(void *),
+                                     void *);
+extern "C" int __wrap_pthread_create(pthread_t * /*thread*/, const pthread_attr_t * /*attr*/,
+                                     void *(* /*entry*/)(void *), void * /*argument*/) {
+    return EAGAIN;
+}
+
+namespace {
+
+using fuzz::must;
+
+constexpr size_t kMostPoints = 400;
+constexpr int64_t kMostSamples = 45'000;
+
+std::vector<int16_t> take_pcm(fuzz::input *in, size_t most) {
+    std::vector<int16_t> pcm(std::min(in->remaining_bytes() / 2, most));
+    if (!pcm.empty()) in->ConsumeData(pcm.data(), 2 * pcm.size());
+    return pcm;
+}
+
+// --- 3: conversion
+
+int32_t take_rate(fuzz::input *in) {
+    return in->ConsumeBool() ? in->ConsumeIntegralInRange(1, 192'000)
+                             : in->PickValueInArray({8000, 11025, 12000, 16000, 22050, 24000, 32000,
+                                                     33075, 44100, 44099, 48000, 88200, 96000});
+}
+
+void interpolate(fuzz::input *in) {
+    const auto state = std::make_unique<dorn_resampler_state>();
+    const int32_t source = take_rate(in);
+    const int32_t target = in->ConsumeBool() ? kAnalysisRate : take_rate(in);
+    const int32_t channels = in->ConsumeIntegralInRange(1, 3);
+    const std::vector<int16_t> pcm = take_pcm(in, 2000);
+    if (pcm.empty() || static_cast<int64_t>(pcm.size()) * target / source > 8000) return;
+    must(dorn_resampler_prepare(state.get(), source, target, channels) == 0, "rates are prepared");
+    std::vector<int16_t> wanted;
+    const int64_t code = reference::convert(*state, pcm, &wanted);
+    std::vector<int16_t> out(std::max<size_t>(wanted.size(), 1));
+    must(dorn_resampler_convert(state.get(), pcm.data(), static_cast<int32_t>(pcm.size()),
+                                out.data()) == code,
+         "a conversion ends where it does");
+    must(std::equal(wanted.begin(), wanted.end(), out.begin()), "a conversion is its sums");
+}
+
+// A whole conversion: the interpolator's samples, or the means of blocks.
+void convert(fuzz::input *in) {
+    const int32_t source =
+        in->ConsumeBool() ? kAnalysisRate * in->ConsumeIntegralInRange(1, 4) : take_rate(in);
+    const bool odd = in->ConsumeBool();
+    const std::vector<int16_t> pcm = take_pcm(in, 2000);
+    const auto samples = static_cast<int64_t>(pcm.size()) - (odd && !pcm.empty() ? 1 : 0);
+    const int64_t bytes = 2 * samples + (odd && !pcm.empty() ? 1 : 0);
+    const int64_t expected = bytes / 2 * kAnalysisRate / source;
+    if (expected > 8000) return;
+    int64_t length = -1;
+    double *out = nullptr;
+    must(dorn_resampler_run(pcm.data(), bytes, source, kAnalysisRate, &length, &out) == 0 &&
+             length == expected,
+         "a conversion has its length");
+    const int32_t block = source % kAnalysisRate == 0 ? source / kAnalysisRate : 0;
+    for (int64_t i = 0; i < length + 8; ++i) {
+        float sum = 0.0f;
+        for (int32_t k = 0; k < block && i < length; ++k)
+            sum += pcm[static_cast<size_t>(i * block + k)];
+        must(block >= 1 && block <= 4
+                 ? out[i] == static_cast<double>(sum / static_cast<float>(block))
+                 : std::fabs(out[i]) <= (i < length ? 32'768.0 : 0.0),
+             "blocks are averaged, samples have 16 bits, cleared bytes follow");
+    }
+    free(out);
+}
+
+// --- 7: the highlight
+
+void measure_power(fuzz::input *in) {
+    const int64_t hop = in->ConsumeIntegralInRange(1, 60);
+    const std::vector<int16_t> pcm = take_pcm(in, 3000);
+    const int64_t count = static_cast<int64_t>(pcm.size()) / hop - 2;
+    std::vector<float> out(static_cast<size_t>(std::max<int64_t>(count, 0)));
+    overlapping_powers(pcm.data(), hop, count, out.data());
+    for (size_t k = 0; k < out.size(); ++k) {
+        const int16_t *window = pcm.data() + static_cast<int64_t>(k) * hop;
+        const float wanted = reference::power(window, 3 * hop);
+        must(window_power(window, 3 * hop) == wanted, "a window has its power");
+        must(std::fabs(out[k] - wanted) <= 1e-6f * std::fmax(wanted, 1.0f),
+             "so have windows that overlap");
+    }
+}
+
+void find_valleys(fuzz::input *in) {
+    const auto mean = in->ConsumeProbability<float>();
+    const auto deviation = in->ConsumeProbability<float>();
+    const auto hop = in->ConsumeBool() ? 2.0f : in->ConsumeFloatingPointInRange(0.01f, 20.0f);
+    const auto curve = fuzz::values<float>(in, kMostPoints);
+    const double threshold = mean > 0.5f
+                                 ? static_cast<double>(mean) - 1.5 * static_cast<double>(deviation)
+                                 : static_cast<double>(mean - deviation);
+    const auto wanted = reference::valleys(curve, static_cast<float>(threshold),
+                                           static_cast<int32_t>(7.0 / static_cast<double>(hop)));
+    std::vector<int32_t> out(15, -7);
+    const int32_t count = tavo_find_valley(curve.data(), static_cast<int32_t>(curve.size()),
+                                           out.data(), mean, deviation, hop);
+    must(count == static_cast<int32_t>(wanted.size()), "as many valleys");
+    must(std::equal(wanted.begin(), wanted.end(), out.begin()), "the same valleys");
+    must(std::count(out.begin(), out.end(), -7) == 15 - count, "nothing behind them");
+}
+
+// count positions below n, ascending, of a list of at least room entries.
+std::vector<int32_t> take_positions(fuzz::input *in, size_t count, size_t room, int32_t n) {
+    std::vector<int32_t> list(count);
+    for (int32_t &at : list) at = in->ConsumeIntegralInRange(0, n - 1);
+    std::sort(list.begin(), list.end());
+    list.resize(std::max(room, count));
+    return list;
+}
+
+void select_region(fuzz::input *in) {
+    const auto nv = in->ConsumeIntegralInRange(0, 15);
+    const auto nseg = in->ConsumeIntegralInRange(0, 30);
+    const int32_t length = in->ConsumeBool() ? in->ConsumeIntegral<uint8_t>()
+                                             : in->ConsumeIntegralInRange(0, INT32_MAX / 2);
+    const int32_t n = in->ConsumeIntegralInRange(1, static_cast<int32_t>(kMostPoints));
+    const int32_t chosen = in->ConsumeIntegralInRange(-1, n);
+    const auto valleys = take_positions(in, static_cast<size_t>(nv), 15, n);
+    const auto pairs = take_positions(in, static_cast<size_t>(2 * nseg), 0, n);
+    const auto mean = in->ConsumeProbability<float>();
+    const auto deviation = in->ConsumeProbability<float>();
+    const auto curve = fuzz::exactly<float>(in, static_cast<size_t>(n));
+    const uint32_t start = tavo_select_highlight_region(
+        curve.data(), n, length, chosen, nv, valleys.data(), pairs.data(), nseg, mean, deviation);
+    must(start < static_cast<uint32_t>(n), "a region starts in the song");
+    must(start == 0 || static_cast<int64_t>(start) + length <= n, "a region fits the song");
+}
+
+void search_curve(fuzz::input *in) {
+    TAVO_HL_CTX hl = {};
+    hl.hl_param =
+        in->ConsumeBool() ? in->ConsumeIntegral<int8_t>() : in->ConsumeIntegral<int32_t>();
+    const bool free_length = in->ConsumeBool();
+    auto curve = fuzz::values<float>(in, kMostPoints);
+    const auto n = static_cast<int32_t>(curve.size());
+    const int32_t duration = free_length ? in->ConsumeIntegral<int32_t>() : 2 * n + 4;
+    hl.power = curve.data();
+    hl.power_count = n;
+    const uint32_t start = _get_HL_simple(&hl, duration);
+    must(start % 2000 == 0 && start < 2000u * static_cast<uint32_t>(std::max(n, 1)),
+         "a start is one of the points");
+    const bool plain = std::all_of(curve.begin(), curve.end(),
+                                   [](float x) { return x == 0.0f || (x > 1e-30f && x < 1e30f); });
+    for (float &value : curve) value *= 0.25f;
+    must(!plain || _get_HL_simple(&hl, duration) == start, "a start does not depend on the volume");
+}
+
+// Each byte is the loudness of a part of a song.
+void whole_highlight(fuzz::input *in) {
+    TAVO_CTX ctx = {};
+    ctx.fmt.sample_rate =
+        5 * in->ConsumeIntegralInRange(1, 8);  // frames of 0.4 s have whole samples
+    const int32_t wanted = in->ConsumeIntegral<int8_t>();
+    const int32_t lied =
+        in->ConsumeIntegralInRange(-2, 2);  // seconds by which the duration is wrong
+    const auto part = in->ConsumeIntegralInRange<size_t>(1, 90);
+    std::vector<int16_t> pcm;
+    for (const int8_t level : in->ConsumeBytes<int8_t>(200))
+        pcm.insert(pcm.end(), part, static_cast<int16_t>(level * 256));
+    const auto samples = static_cast<int64_t>(pcm.size());
+    ctx.pcm = pcm.data();
+    ctx.pcm_bytes = 2 * samples;
+    ctx.duration = (samples / ctx.fmt.sample_rate + lied) * kUnitsPerSecond;
+    ctx.hl = static_cast<TAVO_HL_CTX *>(calloc(1, sizeof(TAVO_HL_CTX)));
+    ctx.hl->hl_param = wanted;
+    const uint32_t start = getHLPosition(&ctx);
+    must(start == ctx.hl->hl_pos, "the start is stored");
+    must(start * static_cast<int64_t>(ctx.fmt.sample_rate) <= samples * 1000 + 1000,
+         "a highlight starts in the song");
+    clearHighlgihtCtx(ctx.hl);
+}
+
+// --- 4 to 6: beats
+
+struct analysis {
+    TAVO_CTX ctx = {};
+    TAVO_ONSET_CTX onset = {};
+    TAVO_BEAT_CTX beat = {};
+    explicit analysis(std::vector<double> *signal) {
+        onset.frame_size = kFrameSize;
+        onset.hop_size = kHopSize;
+        ctx.onset = &onset;
+        ctx.ana = signal->data();
+        ctx.ana_len = static_cast<int64_t>(signal->size());
+        ctx.ana_rate = kAnalysisRate;
+        fnamedec = "";
+    }
+};
+
+// Loudness values, stretched to a signal of full scale 1; the kind of sound changes with them.
+std::vector<double> take_signal(fuzz::input *in) {
+    const auto stretch = in->ConsumeIntegralInRange<size_t>(1, 6000);
+    std::vector<double> signal;
+    uint32_t noise = 1;
+    for (const uint8_t level : in->ConsumeBytes<uint8_t>(kMostSamples / stretch)) {
+        for (size_t i = 0; i < stretch; ++i) {
+            noise = noise * 1664525u + 1013904223u;
+            const double wave = level % 2 == 0              ? noise / 2147483648.0 - 1.0
+                                : i % (2 + level % 32) == 0 ? 1.0
+                                                            : -1.0;
+            signal.push_back(wave * level / 255.0);
+        }
+    }
+    return signal;
+}
+
+void find_rises(fuzz::input *in) {
+    const std::vector<double> signal = take_signal(in);
+    std::vector<int32_t> flags(signal.size());
+    const int32_t count =
+        detectPowerVariation(signal.data(), flags.data(), static_cast<int64_t>(signal.size()));
+    must(count == std::count(flags.begin(), flags.end(), 1), "each rise has its flag");
+    must(flags == reference::rises(signal), "rises are where every sample's level puts them");
+}
+
+void fill_gap(fuzz::input *in) {
+    const auto heights = fuzz::values<double>(in, 60);
+    const auto n = static_cast<int32_t>(heights.size());
+    if (std::any_of(heights.begin(), heights.end(), [](double x) { return std::isnan(x); })) return;
+    std::vector<int32_t> peaks;
+    for (int32_t at = 0; at < n; ++at) {
+        if (in->ConsumeIntegralInRange(0, 3) != 3) peaks.push_back(at);
+    }
+    const auto a = in->ConsumeIntegralInRange(-1, n + 1);
+    const auto b = in->ConsumeIntegralInRange(a, n + 2);
+    const auto most = in->ConsumeIntegralInRange<size_t>(0, 9);
+    const auto wanted = reference::between(a, b, peaks, most, heights);
+    std::vector<int32_t> out(most);
+    const int32_t found =
+        bringMoreBeat(a, b, out.data(), peaks.data(), static_cast<int32_t>(peaks.size()),
+                      static_cast<int32_t>(most), heights.data());
+    out.resize(static_cast<size_t>(found));
+    must(out == wanted, "the strongest peaks come back");
+}
+
+void check_beats(const float *beats, int32_t count, int64_t frames) {
+    const auto last = static_cast<float>(frames + 1) * (1000.0f * kHopSize / kAnalysisRate);
+    for (int32_t k = 0; k < count; ++k) {
+        must(beats[k] > 0.0f && beats[k] <= last, "a beat lies in the song");
+        must(k == 0 || beats[k - 1] <= beats[k], "beats ascend");
+    }
+}
+
+// From an envelope on: tempo, threshold, candidates, gaps. Values repeat.
+void place_beats(fuzz::input *in) {
+    const int32_t limit = in->ConsumeIntegralInRange(-2, 40);
+    const int32_t free_tempo = in->ConsumeBool() ? in->ConsumeIntegralInRange(30, 200) : 0;
+    const auto repeats = in->ConsumeIntegralInRange<size_t>(1, 16);
+    std::vector<int32_t> rises(in->ConsumeIntegralInRange<size_t>(0, 20));
+    for (int32_t &rise : rises) rise = in->ConsumeIntegralInRange(0, 1200);
+    const auto part = fuzz::values<double>(in, 1200);
+    const size_t frames = 1 + std::min<size_t>(part.size() * repeats, 1200);
+
+    std::vector<double> silence(kHopSize * (frames - 1) + kFrameSize);
+    analysis run(&silence);
+    __beat_init(&run.ctx, &run.beat);
+    TAVO_BEAT_CTX *beat = &run.beat;
+    must(beat_ctx_ready(beat) && beat->frame_count == static_cast<int64_t>(frames),
+         "a context is made");
+    std::vector<double> env(frames);
+    for (size_t k = 0; k + 1 < frames; ++k)
+        env[k] = std::isfinite(part[k % part.size()]) ? part[k % part.size()] : 0.0;
+    std::copy(env.begin(), env.end(), beat->onset_env);
+    for (int32_t &rise : rises) rise %= static_cast<int32_t>(frames);
+    std::sort(rises.begin(), rises.end());
+    beat->rise_count = static_cast<int32_t>(rises.size());
+    beat->rise_frames = zeroed_items<int32_t>(beat->rise_count);
+    std::copy(rises.begin(), rises.end(), beat->rise_frames);
+
+    const int32_t bpm = estimate_tempo(beat);
+    must(bpm >= 30 && bpm <= 200, "a tempo is 30 to 200");
+    run.onset.max_beats = limit;
+    run.onset.bpm = free_tempo != 0 ? free_tempo : bpm;
+    std::vector<float> out(static_cast<size_t>(candidate_room(beat)));
+    const int32_t count = getBeatCandi_MT(beat, &run.onset, out.data());
+    must(count >= 0 && (limit < 1 || count <= limit + kMaxAddedBeats), "beats are limited");
+    check_beats(out.data(), count, beat->frame_count);
+    const double four_beats = std::trunc(4.0 * 60.0 / run.onset.bpm);
+    const auto window = static_cast<int64_t>(static_cast<float>(four_beats) / beat->frame_times[0]);
+    const auto curve = reference::threshold(env, window + window % 2);
+    must(std::equal(curve.begin(), curve.end(), beat->threshold),
+         "a threshold is a sort for each place");
+    __tavo_deinit(beat);
+}
+
+void whole_beats(fuzz::input *in) {
+    const int32_t limit = in->ConsumeIntegral<int8_t>();
+    std::vector<double> signal = take_signal(in);
+    for (double &sample : signal) sample *= 32767.0;
+    analysis run(&signal);
+    run.onset.max_beats = limit;
+    const int32_t count = getBeatPosition(&run.ctx);
+    must(count == run.onset.beat_count && run.ctx.state == kStateFinished, "it runs to its end");
+    must(run.onset.bpm >= 30 && run.onset.bpm <= 200, "a tempo is 30 to 200");
+    check_beats(run.onset.beat_times, count, run.ctx.ana_len / kHopSize);
+    free(run.onset.beat_times);
+}
+
+// Whatever beats there are, blips stay in the track.
+void lay_blips(fuzz::input *in) {
+    const int32_t rate = in->ConsumeIntegralInRange(1, 192'000);
+    std::vector<float> track(in->ConsumeIntegralInRange<size_t>(0, 30'000));
+    const auto beats = fuzz::values<float>(in, 64);
+    makeBlipTrack(beats.data(), static_cast<int32_t>(beats.size()), rate,
+                  static_cast<int64_t>(track.size()), track.data());
+}
+
+}  // namespace
+
+int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
+    fuzz::run_one({interpolate, convert, measure_power, find_valleys, select_region, search_curve,
+                   whole_highlight, find_rises, fill_gap, place_beats, whole_beats, lay_blips},
+                  data, size);
+    return 0;
+}

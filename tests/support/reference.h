@@ -1,0 +1,190 @@
+// Plain forms of what the library evaluates in a faster way: written from the definition, in its
+// precisions and orders.
+#ifndef TAVO_TESTS_SUPPORT_REFERENCE_H
+#define TAVO_TESTS_SUPPORT_REFERENCE_H
+
+#include <algorithm>
+#include <cmath>
+#include <vector>
+
+#include "pcm/resample.h"
+
+namespace reference {
+
+struct complex_signal {
+    std::vector<double> re, im;
+};
+
+// The first outputs values of the transform of the first inputs values; the rest is 0. sign: -1
+// forward, 1 inverse, which divides by the length. real: imaginary inputs count as 0.
+inline complex_signal transform(const complex_signal &x, int inputs, int outputs, bool real,
+                                double sign) {
+    constexpr double kTwoPi = 6.283185307179586;
+    const auto n = static_cast<int>(x.re.size());
+    complex_signal y = {std::vector<double>(x.re.size()), std::vector<double>(x.re.size())};
+    for (int k = 0; k < std::min(outputs, n); ++k) {
+        double re = 0.0, im = 0.0;
+        for (int j = 0; j < std::min(inputs, n); ++j) {
+            const auto at = static_cast<size_t>(j);
+            const double angle = sign * kTwoPi * (j * k % n) / n;
+            const double imaginary = real ? 0.0 : x.im[at];
+            re += x.re[at] * std::cos(angle) - imaginary * std::sin(angle);
+            im += x.re[at] * std::sin(angle) + imaginary * std::cos(angle);
+        }
+        y.re[static_cast<size_t>(k)] = sign > 0.0 ? re / n : re;
+        y.im[static_cast<size_t>(k)] = sign > 0.0 ? im / n : im;
+    }
+    return y;
+}
+
+// The windowed-sinc converter. Returns the samples written to out, -1 for a phase out of range.
+inline int64_t convert(const dorn_resampler_state &s, const std::vector<int16_t> &in,
+                       std::vector<int16_t> *out) {
+    const auto len = static_cast<int64_t>(in.size());
+    const float h = static_cast<float>(s.taps) / 2;
+    for (int64_t j = 0;; ++j) {
+        const float pos = s.ratio * static_cast<float>(j);
+        const auto i0 = static_cast<int64_t>(std::floor(pos));
+        if (static_cast<int64_t>((h + static_cast<float>(i0)) * static_cast<float>(s.channels)) >=
+            len) {
+            return j * s.channels;
+        }
+        const double centre = static_cast<double>(i0) + (s.taps % 2 == 1 ? 0.5 : 0.0);
+        const auto frac = static_cast<float>(static_cast<double>(pos) - centre);
+        if (std::fabs(frac) > 0.500001) return -1;
+        const auto p =
+            static_cast<int64_t>(std::floor(960.0 * static_cast<double>(frac) + 480.0 + 0.5));
+        for (int64_t c = 0; c < s.channels; ++c) {
+            float acc = 0.0f;
+            for (int64_t k = 0; k <= s.taps; ++k) {
+                const int64_t at = (i0 - static_cast<int64_t>(h) + k) * s.channels + c;
+                const int16_t x = at < 0 || at >= len ? int16_t{0} : in[static_cast<size_t>(at)];
+                acc += s.coef[p][k] * static_cast<float>(x);
+            }
+            const auto value = static_cast<int64_t>(std::floor(static_cast<double>(acc) + 0.5));
+            out->push_back(static_cast<int16_t>(static_cast<uint16_t>(value & 0xFFFF)));
+        }
+    }
+}
+
+// 10 log10(mean square + 1) of the window samples at pcm, full scale 1.
+inline float power(const int16_t *pcm, int64_t window) {
+    double sum = 0.0;
+    for (int64_t i = 0; i < window; ++i) sum += (pcm[i] / 32767.0) * (pcm[i] / 32767.0);
+    return 10.0f * std::log10(static_cast<float>(sum / static_cast<double>(window)) + 1.0f);
+}
+
+// The 97th percentile of count values from start on.
+inline double percentile(const std::vector<double> &env, int64_t start, int64_t count) {
+    std::vector<double> window(env.begin() + start, env.begin() + start + count);
+    std::sort(window.begin(), window.end());
+    return window[static_cast<size_t>(count * 97 / 100)];
+}
+
+// The threshold curve of an envelope, each place by itself.
+inline std::vector<double> threshold(const std::vector<double> &env, int64_t window) {
+    const auto frames = static_cast<int64_t>(env.size());
+    const int64_t count = frames - 1;
+    const int64_t half = window / 2;
+    std::vector<double> thr(static_cast<size_t>(count));
+    if (count < 1) return thr;
+    const auto at = [&](int64_t i) -> double & { return thr[static_cast<size_t>(i)]; };
+    double top = 0.0;
+    for (int64_t i = half; i <= std::max(half, count - half) && count - window >= -3; ++i) {
+        at(i) = percentile(env, i - half, std::min(window, frames - (i - half)));
+        top = std::max(top, at(i));
+    }
+    const int64_t tail = std::max<int64_t>(count - half, 1);
+    const double slope = (top - at(tail - 1)) / (static_cast<double>(window) * 0.5);
+    for (int64_t i = tail; i < count; ++i) at(i) = top - slope * static_cast<double>(count - i);
+    for (int64_t i = 21; i < std::min(half, count); ++i) {
+        at(i) = percentile(env, i - 21, std::min<int64_t>(43, frames - (i - 21)));
+    }
+    return thr;
+}
+
+// The samples at which a power rise starts, with the level of every sample at hand.
+inline std::vector<int32_t> rises(const std::vector<double> &signal) {
+    constexpr int64_t kBlock = 5512;
+    const auto n = static_cast<int64_t>(signal.size());
+    const int64_t count = n / kBlock + 1;
+    std::vector<int32_t> flags(signal.size());
+    if (count < 3) return flags;
+    std::vector<double> db(signal.size(), -150.0), block(static_cast<size_t>(count + 8), -150.0);
+    int32_t held = 0;
+    double loudest = -150.0;
+    for (int64_t i = 5; i <= n - 5; ++i) {
+        double sum = 0.0;
+        for (int64_t k = i - 5; k < i + 5; ++k)
+            sum += signal[static_cast<size_t>(k)] * signal[static_cast<size_t>(k)];
+        const auto value = static_cast<int32_t>(std::min(sum / 10.0 * 32767.0, 32767.0));
+        const int32_t level = std::max(value, held);
+        held = level - level / 1000;
+        double &here = db[static_cast<size_t>(i)];
+        here = 20.0 * std::log10(std::max(level, 1000) / 32767.0);
+        loudest = std::max(loudest, here);
+        if (i % kBlock != 0) continue;
+        here = block[static_cast<size_t>(i / kBlock)] = loudest;
+        loudest = -150.0;
+    }
+    std::vector<double> sorted(block.begin(), block.end() - 8);
+    std::sort(sorted.begin(), sorted.end());
+    const double p60 = sorted[static_cast<size_t>(static_cast<double>(count) * 0.6)];
+    const double p40 = sorted[static_cast<size_t>(static_cast<double>(count) * 0.4)];
+    for (int64_t b = 2; b < count; ++b) {
+        const double *at = &block[static_cast<size_t>(b)];
+        double mean = 0.0;
+        for (int k = 0; k < 8; ++k) mean += at[k];
+        mean *= 0.125;
+        const double limit = std::min((p60 + p40) * 0.5, mean - 4.0);
+        if (!(at[-2] < limit && at[-1] < limit && mean >= p60 - 3.0 && at[0] > p60 - 3.0)) continue;
+        const auto begin = db.begin() + kBlock * (b - 1);
+        const auto found = std::find_if(begin, begin + kBlock + 1, [&](double level) {
+            return level >= (mean + 3.0 * p60) * 0.5;
+        });
+        if (found == begin + kBlock + 1) continue;
+        flags[static_cast<size_t>(found - db.begin())] = 1;
+        b += 6;  // and the loop's own step
+    }
+    return flags;
+}
+
+// The peaks that are put back between frames a and b: at most maxn, the strongest first when there
+// are more. Of equal ones the first stands for all.
+inline std::vector<int32_t> between(int32_t a, int32_t b, const std::vector<int32_t> &peaks,
+                                    size_t maxn, const std::vector<double> &env) {
+    const auto height = [&](int32_t peak) { return env[static_cast<size_t>(peak)]; };
+    const auto own = std::lower_bound(peaks.begin(), peaks.end(), a);
+    if (own == peaks.end() || maxn == 0) return {};
+    const auto end = std::max(own + 1, std::lower_bound(own, peaks.end(), b));
+    const std::vector<int32_t> list(own + 1, end);
+    if (list.size() <= maxn) return list;
+    std::vector<int32_t> strongest = list;
+    std::stable_sort(strongest.begin(), strongest.end(),
+                     [&](int32_t x, int32_t y) { return height(x) > height(y); });
+    strongest.resize(maxn);
+    for (int32_t &peak : strongest) {
+        peak = *std::find_if(list.begin(), list.end(),
+                             [&](int32_t x) { return height(x) == height(peak); });
+    }
+    return strongest;
+}
+
+// Ends of the quiet stretches: the last low point of each run of low points less than gap apart.
+inline std::vector<int32_t> valleys(const std::vector<float> &values, float threshold,
+                                    int32_t gap) {
+    std::vector<int32_t> lows, ends;
+    for (size_t i = 0; i < values.size(); ++i) {
+        if (values[i] < threshold) lows.push_back(static_cast<int32_t>(i));
+    }
+    for (size_t k = 0; k < lows.size(); ++k) {
+        const bool last = k + 1 == lows.size();
+        if (last || (lows[k + 1] - lows[k] >= gap && lows[k] != 0)) ends.push_back(lows[k]);
+    }
+    if (ends.size() > 15) ends.resize(15);
+    return ends;
+}
+
+}  // namespace reference
+
+#endif
