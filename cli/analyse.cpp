@@ -10,17 +10,17 @@
 #include "cli/explain.h"
 #include "cli/library_path.h"
 #include "cli/words.h"
-#include "common/tavo_ctx.h"
+#include "core/tavo.h"
 
 namespace {
 
-// Written by the callback on the job's thread, which is told nothing of its caller: the flag hands
-// the result over, the pipe wakes the waiting thread.
-std::atomic<bool> result_ready{false};
+// Written by the callback on the job's thread, which is told nothing of its caller: the pointer
+// hands the result over, the pipe wakes the waiting thread.
+std::atomic<const TAVO_INFO *> result{nullptr};
 int done_write_fd = -1;
 
-void on_result(TAVO_INFO * /*info*/) {
-    result_ready.store(true, std::memory_order_release);
+void on_result(TAVO_INFO *info) {
+    result.store(info, std::memory_order_release);
     const char done = 1;
     while (write(done_write_fd, &done, 1) < 0 && errno == EINTR) {
     }
@@ -31,27 +31,25 @@ bool wait_for_result(int done_fd, int stop_fd) {
     pollfd watched[2] = {{done_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
     while (true) {
         if (poll(watched, 2, -1) < 0) continue;  // EINTR
-        if (watched[0].revents != 0) return result_ready.load(std::memory_order_acquire);
+        if (watched[0].revents != 0) return result.load(std::memory_order_acquire) != nullptr;
         if (watched[1].revents != 0) return false;
     }
 }
 
 void take_stream(const TAVO_CTX *ctx, record &out) {
+    tavo_get_stream(ctx, &out.sample_rate, &out.channels, &out.duration_ms);
     out.has_stream = true;
-    out.sample_rate = ctx->fmt.sample_rate;
-    out.channels = ctx->fmt.channels;
-    out.duration_ms = ctx->duration / kUnitsPerMs;
 }
 
 // After the callback the job writes nothing any more.
-void take_result(const TAVO_CTX *ctx, record &out) {
-    if (ctx->pcm_bytes <= 0) {
+void take_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
+    if (tavo_has_audio(ctx) == 0) {
         out.error = "No audio could be decoded from the file.";
         return;
     }
     out.has_highlight = out.mode != TAVO_MODE_BEATS;
-    out.hl_pos_ms = ctx->info->hl_pos;
-    if (ctx->info->status != 0) {
+    out.hl_pos_ms = info->hl_pos;
+    if (info->status != 0) {
         out.error = out.mode == TAVO_MODE_BOTH
                         ? "No beats were found after the highlight."
                         : "No beats were found: the file may be silent or too short for a rhythm.";
@@ -60,8 +58,7 @@ void take_result(const TAVO_CTX *ctx, record &out) {
     out.status = outcome::ok;
     if (out.mode == TAVO_MODE_HIGHLIGHT) return;
     out.has_beats = true;
-    out.bpm = ctx->onset->bpm;
-    const TAVO_INFO *info = ctx->info;
+    out.bpm = tavo_get_tempo(ctx);
     out.beats_ms.assign(info->beat_times, info->beat_times + info->beat_count);
 }
 
@@ -75,13 +72,13 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
         return;
     }
     done_write_fd = done_pipe[1];
-    result_ready.store(false);
+    result.store(nullptr);
     tavo_setcallback(ctx, on_result);
     const int32_t code = tavo_analyze(ctx, opts.length_s, opts.max_beats, 0);
     if (code != TAVO_OK) {
         out.error = "The analysis could not be started (code " + std::to_string(code) + ").";
     } else if (wait_for_result(done_pipe[0], stop_fd)) {
-        take_result(ctx, out);
+        take_result(ctx, result.load(), out);
     } else {
         out.status = outcome::stopped;
         out.error = "The analysis was stopped.";

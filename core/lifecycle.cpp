@@ -1,7 +1,9 @@
 #include "core/lifecycle.h"
 
+#include <android/log.h>
 #include <sched.h>
 
+#include "core/instance.h"
 #include "core/jobs.h"
 
 extern "C" {
@@ -11,15 +13,28 @@ pthread_cond_t tavo_cond;
 
 namespace {
 
-bool job_ended(const TAVO_CTX *ctx) {
-    const int32_t state = load_flag(&ctx->state);
-    return state == kStateFinished || state == kStateFailed;
+using job_entry = void *(*)(void *ctx);
+
+// The job of each mode.
+constexpr job_entry kJobs[] = {analyzeHighlightOnly, analyzeOnsetOnly, analyzeOnsetFromeHi};
+static_assert(TAVO_MODE_HIGHLIGHT == 0 && TAVO_MODE_BEATS == 1 && TAVO_MODE_BOTH == 2);
+
+bool create_locks() {
+    if (pthread_mutex_init(&tavo_mutex, nullptr) != 0) return false;
+    if (pthread_cond_init(&tavo_cond, nullptr) == 0) return true;
+    pthread_mutex_destroy(&tavo_mutex);
+    return false;
 }
 
-// The poll does not sleep, so that a stop costs no more than the rest of the job; it yields, so
-// that the job gets the processor where there is only one.
+void destroy_locks() {
+    pthread_cond_destroy(&tavo_cond);
+    pthread_mutex_destroy(&tavo_mutex);
+}
+
+// Polls without sleeping, so that a stop takes no longer than the rest of the job; yields, so that
+// the job gets the processor if there is only one.
 void poll_until_ended(const TAVO_CTX *ctx) {
-    while (!job_ended(ctx)) sched_yield();
+    while (!has_ended(ctx)) sched_yield();
 }
 
 // True inside the callback of the job that tavo_analyze started: tavo_deinit would join itself.
@@ -27,38 +42,41 @@ bool runs_job_of(const TAVO_CTX *ctx) {
     return pthread_equal(ctx->worker, pthread_self()) != 0;
 }
 
-// A job may have been run without tavo_analyze, on a thread that is not ours to join.
-void join_worker(TAVO_CTX *ctx) {
+// There is nothing to join if the job was run without tavo_analyze, on a thread of the host's.
+void join_worker(const TAVO_CTX *ctx) {
     if (pthread_equal(ctx->worker, pthread_t{}) == 0) pthread_join(ctx->worker, nullptr);
 }
 
-// Stores what the mode needs of the arguments. Returns the job's entry, null for an unknown mode.
-void *(*prepare_job(TAVO_CTX *ctx, int32_t hl_param, int32_t max_beats,
-                    int32_t beat_param2))(void *) {
-    const bool highlight = ctx->mode == TAVO_MODE_HIGHLIGHT || ctx->mode == TAVO_MODE_BOTH;
-    const bool beats = ctx->mode == TAVO_MODE_BEATS || ctx->mode == TAVO_MODE_BOTH;
-    if (highlight) ctx->hl->hl_param = hl_param;
-    if (beats) {
-        ctx->onset->max_beats = max_beats;
-        ctx->onset->beat_param2 = beat_param2;
-    }
-    if (highlight && beats) return analyzeOnsetFromeHi;
-    if (beats) return analyzeOnsetOnly;
-    return highlight ? analyzeHighlightOnly : nullptr;
-}
-
 }  // namespace
+
+extern "C" TAVO_CTX *tavo_init(const TAVO_PARAM *param, int32_t *err) {
+    int32_t unread = 0;
+    if (err == nullptr) err = &unread;
+    *err = TAVO_ERR_HANDLE;
+    if (param == nullptr || !create_locks()) return nullptr;
+    TAVO_CTX *ctx = open_instance(param, err);
+    if (ctx == nullptr) {
+        destroy_locks();
+        return nullptr;
+    }
+    __android_log_print(ANDROID_LOG_DEBUG, "tavo", "tavo_init64() complete (%d) \n", 0);
+    return ctx;
+}
 
 extern "C" int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_beats,
                                 int32_t beat_param2) {
     if (!is_instance(ctx)) return TAVO_ERR_HANDLE;
     if (load_flag(&ctx->state) != kStateReady) return TAVO_ERR_NOT_READY;
-    void *(*entry)(void *) = prepare_job(ctx, hl_param, max_beats, beat_param2);
-    if (entry == nullptr) return TAVO_ERR_HANDLE;
+    if (ctx->mode < TAVO_MODE_HIGHLIGHT || ctx->mode > TAVO_MODE_BOTH) return TAVO_ERR_HANDLE;
+    if (finds_highlight(ctx->mode)) ctx->hl->hl_param = hl_param;
+    if (finds_beats(ctx->mode)) {
+        ctx->onset->max_beats = max_beats;
+        ctx->onset->beat_param2 = beat_param2;
+    }
 
     // Before the thread exists: a quick job's final state must not be overwritten.
     store_flag(&ctx->state, kStateRunning);
-    if (pthread_create(&ctx->worker, nullptr, entry, ctx) != 0) {
+    if (pthread_create(&ctx->worker, nullptr, kJobs[ctx->mode], ctx) != 0) {
         ctx->worker = pthread_t{};
         store_flag(&ctx->state, kStateReady);
         return TAVO_ERR_MEMORY;
@@ -75,13 +93,12 @@ extern "C" int32_t tavo_deinit(TAVO_CTX *ctx) {
         _tavo_quit(ctx);
         pthread_mutex_lock(&tavo_mutex);
         join_worker(ctx);
-    } else if (job_ended(ctx)) {
+    } else if (has_ended(ctx)) {
         join_worker(ctx);  // at most its callback still runs
     }
     clearTavoCtx(ctx);
     pthread_mutex_unlock(&tavo_mutex);
-    pthread_cond_destroy(&tavo_cond);
-    pthread_mutex_destroy(&tavo_mutex);
+    destroy_locks();
     return TAVO_OK;
 }
 
@@ -99,14 +116,14 @@ extern "C" int32_t _tavo_quit(TAVO_CTX *ctx) {
         return TAVO_OK;
     }
     pthread_mutex_lock(&tavo_mutex);
-    while (!job_ended(ctx)) pthread_cond_wait(&tavo_cond, &tavo_mutex);
+    while (!has_ended(ctx)) pthread_cond_wait(&tavo_cond, &tavo_mutex);
     pthread_mutex_unlock(&tavo_mutex);
     pthread_join(watcher, nullptr);
     return TAVO_OK;
 }
 
 extern "C" void *_thd_quit_wait(void *arg) {
-    const TAVO_CTX *ctx = static_cast<const TAVO_CTX *>(arg);
+    const auto *ctx = static_cast<const TAVO_CTX *>(arg);
     poll_until_ended(ctx);
     pthread_mutex_lock(&tavo_mutex);
     pthread_cond_signal(&tavo_cond);

@@ -1,5 +1,6 @@
-/* analyze_file FILE [SECONDS]: prints where the highlight of a song starts and where its beats from
- * there on are, in milliseconds. SECONDS is the length of the highlight wanted, 30 unless given.
+/* analyze_file FILE [SECONDS]: prints a song's stream, where its highlight starts, and the tempo
+ * and the beats from there on; times are in milliseconds. SECONDS is the length of the highlight
+ * wanted, 30 unless given.
  *
  * cc analyze_file.c -o analyze_file $(pkg-config --cflags --libs tavo) -pthread
  */
@@ -8,15 +9,22 @@
 #include <stdlib.h>
 #include <tavo.h>
 
-/* What the library's thread tells the main thread. The library passes no pointer of ours, so that
- * there is one for the process, as there is one analysis. */
+/* From <media_source/mtsrc.h>, which is C++: the code for which a file cannot be used. */
+struct mtsrc_param {
+    const char *path;
+};
+struct mtsrc_ctx *mtsrc_init(const struct mtsrc_param *param, int32_t *err);
+int32_t mtsrc_deinit(struct mtsrc_ctx *src);
+
+/* Handed from the library's thread to the main thread. It is static because the callback gets no
+ * pointer of ours; one is enough, as there is one analysis in a process. */
 static struct {
     pthread_mutex_t lock;
     pthread_cond_t changed;
     TAVO_INFO *info; /* null until the result is there; the library's until tavo_deinit */
 } result = {PTHREAD_MUTEX_INITIALIZER, PTHREAD_COND_INITIALIZER, NULL};
 
-/* On a thread of the library's own. tavo_deinit is not for here. */
+/* Runs on a thread of the library, where tavo_deinit is not allowed. */
 static void on_result(TAVO_INFO *info) {
     pthread_mutex_lock(&result.lock);
     result.info = info;
@@ -31,12 +39,34 @@ static const TAVO_INFO *wait_for_result(void) {
     return result.info;
 }
 
-static int print_result(const TAVO_INFO *info) {
+/* tavo_init has one code for every unusable file: the media source knows the reason. */
+static int print_reason(const char *path) {
+    const struct mtsrc_param param = {path};
+    int32_t reason = TAVO_OK;
+    struct mtsrc_ctx *source = mtsrc_init(&param, &reason);
+    if (source != NULL) {
+        mtsrc_deinit(source);
+        fprintf(stderr, "analyze_file: %s is too short or its sample rate too low\n", path);
+    } else {
+        fprintf(stderr, "analyze_file: %s cannot be used (%d)\n", path, (int)reason);
+    }
+    return EXIT_FAILURE;
+}
+
+static int print_result(const TAVO_CTX *tavo, const TAVO_INFO *info) {
+    int32_t rate = 0;
+    int32_t channels = 0;
+    int64_t duration_ms = 0;
+    tavo_get_stream(tavo, &rate, &channels, &duration_ms);
+    printf("stream %d Hz, channels %d, %lld ms\n", (int)rate, (int)channels,
+           (long long)duration_ms);
     if (info->status != 0) {
-        fputs("analyze_file: the analysis failed\n", stderr);
+        fputs(tavo_has_audio(tavo) ? "analyze_file: no beats were found\n"
+                                   : "analyze_file: no audio could be decoded\n",
+              stderr);
         return EXIT_FAILURE;
     }
-    printf("highlight %d\n", (int)info->hl_pos);
+    printf("highlight %d\ntempo %d\n", (int)info->hl_pos, (int)tavo_get_tempo(tavo));
     for (int32_t i = 0; i < info->beat_count; ++i) printf("beat %.3f\n", info->beat_times[i]);
     return fflush(stdout) == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
 }
@@ -48,22 +78,19 @@ int main(int argc, char **argv) {
     }
     const int32_t seconds = argc > 2 ? (int32_t)strtol(argv[2], NULL, 10) : 30;
 
-    fnamedec = ""; /* no click track: it would be written into the working directory */
+    fnamedec = ""; /* write no click track: the default path is in the working directory */
     const TAVO_PARAM param = {argv[1], TAVO_MODE_BOTH};
     int32_t err = TAVO_OK;
     TAVO_CTX *tavo = tavo_init(&param, &err);
-    if (tavo == NULL) {
-        fprintf(stderr, "analyze_file: %s cannot be analysed (%d)\n", argv[1], (int)err);
-        return EXIT_FAILURE;
-    }
+    if (tavo == NULL) return print_reason(argv[1]);
     tavo_setcallback(tavo, on_result);
     int status = EXIT_FAILURE;
     err = tavo_analyze(tavo, seconds, 0, 0);
     if (err == TAVO_OK) {
-        status = print_result(wait_for_result());
+        status = print_result(tavo, wait_for_result());
     } else { /* no callback will come */
         fprintf(stderr, "analyze_file: the analysis could not be started (%d)\n", (int)err);
     }
-    tavo_deinit(tavo); /* the result ends here */
+    tavo_deinit(tavo); /* releases the result as well */
     return status;
 }

@@ -330,6 +330,10 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *, jobject) {
     return result;
 }
 
+JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *, jclass) {
+    fnamedec = "";
+}
+
 void tavocallback(TAVO_INFO *info) {
     JavaVM *vm = load_pointer(&java_vm);
     bool attached_here = false;

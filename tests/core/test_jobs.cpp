@@ -5,6 +5,8 @@
 
 #include "common/alloc.h"
 #include "core/jobs.h"
+#include "media_source/mtsrc_ctx.h"
+#include "pcm/decode.h"
 #include "tests/core/core_song.h"
 #include "tests/support/job_harness.h"
 
@@ -16,6 +18,9 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     if (ctx == nullptr) return {};
     EXPECT_EQ(tavo_analyze(ctx, 0, max_beats, 0), 0);
     const job::result result = job::wait();
+    EXPECT_EQ(tavo_has_audio(ctx), 1);
+    // The nearest periods of whole frames are 21 and 22, 123 and 117 BPM.
+    EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);
     EXPECT_EQ(tavo_deinit(ctx), 0);
     EXPECT_EQ(job::last.calls, 1);
     EXPECT_EQ(result.status, 0);
@@ -60,6 +65,27 @@ TEST(Jobs, BothIsBeatsOfTheRestOfTheFile) {
     job::result beats = run(file.path, TAVO_MODE_BEATS, 7);
     for (float &ms : beats.beats) ms += static_cast<float>(both.hl_pos);
     EXPECT_EQ(both.beats, beats.beats);
+}
+
+int32_t read_nothing(mtsrc_ctx *, int32_t, mtsrc_frame *) {
+    return TAVO_ERR_READ;
+}
+
+// Only modes 1 and 2 have a failure to report; the host of mode 0 asks for the audio.
+TEST(Jobs, AFileThatCannotBeDecodedEndsInEveryMode) {
+    for (int32_t mode : {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH}) {
+        SCOPED_TRACE(mode);
+        TAVO_CTX *ctx = job::create(core_song::path(), mode);
+        ASSERT_NE(ctx, nullptr);
+        for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].src->get_frm = read_nothing;
+        EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+        const job::result result = job::wait();
+        EXPECT_EQ(result.status, mode == TAVO_MODE_HIGHLIGHT ? 0 : -1);
+        EXPECT_EQ(result.hl_pos, 0);
+        EXPECT_EQ(tavo_has_audio(ctx), 0);
+        EXPECT_EQ(tavo_get_tempo(ctx), 0);
+        EXPECT_EQ(tavo_deinit(ctx), 0);
+    }
 }
 
 // The beat analysis alone, on an analysis signal put into the instance, returns to its caller. In

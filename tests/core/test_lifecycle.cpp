@@ -36,6 +36,15 @@ TEST(Lifecycle, CreationMakesWhatTheModeNeeds) {
             EXPECT_EQ(ctx->onset->frame_size, 512);
             EXPECT_EQ(ctx->onset->hop_size, 256);
         }
+        int32_t rate = 0, channels = 0;
+        int64_t ms = 0;
+        EXPECT_EQ(tavo_get_stream(ctx, &rate, &channels, &ms), 0);
+        EXPECT_EQ(tavo_get_stream(ctx, nullptr, nullptr, nullptr), 0);
+        EXPECT_EQ(rate, 22050);
+        EXPECT_EQ(channels, 1);
+        EXPECT_EQ(ms, 100'000);
+        EXPECT_EQ(tavo_get_tempo(ctx), 0);
+        EXPECT_EQ(tavo_has_audio(ctx), 0);
         EXPECT_EQ(_tavo_quit(ctx), 0);  // no job: nothing to stop
         EXPECT_EQ(ctx->quit, 0);
         EXPECT_EQ(tavo_deinit(ctx), 0);
@@ -72,7 +81,12 @@ TEST(Lifecycle, BadHandlesTouchNothing) {
     memcpy(wrong.magic, "KOVA", 4);
     wrong.state = 1;
     for (TAVO_CTX *ctx : {static_cast<TAVO_CTX *>(nullptr), &wrong}) {
+        int32_t rate = 99;
         EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -4);
+        EXPECT_EQ(tavo_get_stream(ctx, &rate, nullptr, nullptr), -4);
+        EXPECT_EQ(rate, 99);
+        EXPECT_EQ(tavo_get_tempo(ctx), 0);
+        EXPECT_EQ(tavo_has_audio(ctx), 0);
         EXPECT_EQ(_tavo_quit(ctx), -4);
         EXPECT_EQ(tavo_deinit(ctx), -4);
     }

@@ -35,7 +35,10 @@ def example_lines(result):
     """What the example prints for the command's result, whose times are the shortest decimals
     that give back the library's single-precision numbers."""
     times = array.array("f", result["beats_ms"])
-    return [f"highlight {result['hl_pos_ms']}", *(f"beat {time:.3f}" for time in times)]
+    return [f"stream {result['sample_rate']} Hz, channels {result['channels']}, "
+            f"{result['duration_ms']} ms",
+            f"highlight {result['hl_pos_ms']}", f"tempo {result['bpm']}",
+            *(f"beat {time:.3f}" for time in times)]
 
 
 class Installed(unittest.TestCase):
@@ -83,12 +86,17 @@ class Installed(unittest.TestCase):
         self.assertEqual(run(build / "analyze_file", self.song).splitlines(), expected)
         self.assertEqual(self.run_linked(program, self.song, cwd=empty).splitlines(), expected)
         self.assertEqual(os.listdir(empty), [])  # no click track
-        for arguments, status in (([program], 1), (["missing"], 1), ([], 2), (["a", "1", "b"], 2)):
+        short = self.folder / "short.wav"
+        run(MAKE_SONG, short, "--seconds", "1")
+        for arguments, status, reason in (([self.examples / "analyze_file.c"], 1, "(-3)"),
+                                          (["missing"], 1, "(-7)"), ([short], 1, "too short"),
+                                          ([], 2, "usage"),
+                                          (["a", "1", "b"], 2, "usage")):
             with self.subTest(arguments=arguments):
                 done = subprocess.run([build / "analyze_file", *arguments], text=True,
                                       capture_output=True, check=False)
                 self.assertEqual((done.returncode, done.stdout), (status, ""))
-                self.assertIn("analyze_file", done.stderr)
+                self.assertIn(reason, done.stderr)
 
     def test_find_package_refuses_another_major_version(self):
         project = self.folder / "other"

@@ -8,20 +8,22 @@ import java.util.List;
 import java.util.concurrent.CountDownLatch;
 
 /**
- * Analyses files from the command line and prints what the command {@code tavo} prints of their
- * highlight and beats: {@code java -cp tavo.jar com.kestu.tavo.Analyze [options] FILE...}
+ * An example for desktop machines: analyses files from the command line and prints their highlight
+ * and beats as the command {@code tavo} does. It is the main class of {@code tavo.jar}:
+ *
+ * <pre>{@code java -Djava.library.path=LIB -jar tavo.jar [options] FILE...}</pre>
+ *
+ * <p>LIB is the directory of {@code libtavo.so}: {@code build/release/lib} after a build,
+ * {@code PREFIX/lib} after an installation, where the jar is
+ * {@code PREFIX/share/java/tavo.jar}.
  *
  * <p>Exit status: 0, 1 when a file failed, 2 for wrong usage.
  */
 public final class Analyze {
     private static final String USAGE =
-            "usage: java -Djava.library.path=LIB -cp tavo.jar com.kestu.tavo.Analyze\n"
+            "usage: java -Djava.library.path=LIB -jar tavo.jar\n"
                     + "           [--mode highlight|beats|both] [--length SECONDS]"
                     + " [--max-beats N] FILE...";
-
-    static {
-        System.loadLibrary("tavo_analyze");
-    }
 
     private int mode = Tavo.MODE_BOTH;
     private int lengthSeconds = 0;
@@ -29,9 +31,6 @@ public final class Analyze {
     private final List<String> files = new ArrayList<>();
 
     private Analyze() {}
-
-    /** Points the library's diagnostic click track at no file, for the whole process. */
-    static native void writeNoClickTrack();
 
     public static void main(String[] arguments) throws UnsupportedEncodingException {
         Analyze command = new Analyze();
@@ -80,7 +79,7 @@ public final class Analyze {
 
     /** Returns whether every file had a result. */
     private boolean run() throws UnsupportedEncodingException {
-        writeNoClickTrack();
+        Tavo.disableClickTrack();
         boolean allDone = true;
         try (PrintStream out = new PrintStream(System.out, true, "UTF-8")) {
             for (String file : files) {

@@ -6,6 +6,7 @@ import java.lang.ref.WeakReference;
  * Finds the highlight and the beats of a song.
  *
  * <pre>{@code
+ * Tavo.disableClickTrack();
  * Tavo tavo = new Tavo(listener);
  * if (tavo.init(path, Tavo.MODE_BOTH) == 0) tavo.analyze(30, 0, 0);
  * // the listener is called once, on another thread; then, or to stop early:
@@ -27,6 +28,10 @@ import java.lang.ref.WeakReference;
  * event is wanted, since that of a collected object is dropped. The native analysis itself is
  * released by {@code deinit} alone; what a forgotten object has left open, the next object's
  * {@code deinit} releases.
+ *
+ * <p><b>Click track.</b> The modes with beats write a diagnostic WAV file into the working directory
+ * unless {@link #disableClickTrack} was called. On Android the working directory is not writable and
+ * no file appears.
  *
  * <p><b>Paths.</b> Characters outside the basic multilingual plane (emoji, for one) reach the
  * library in Java's own form and name no file: open such a file and pass
@@ -70,6 +75,13 @@ public final class Tavo implements AutoCloseable {
         this.listener = listener;
         native_setup(new WeakReference<>(this));
     }
+
+    /**
+     * Stops the library from writing its diagnostic click track, a WAV file in the working directory
+     * that every analysis with beats overwrites. It holds for the whole process and cannot be undone.
+     * Call it before {@link #analyze}.
+     */
+    public static native void disableClickTrack();
 
     /** Tells the library whom its events are for: the object's own weak reference. */
     private native void native_setup(Object obj);
