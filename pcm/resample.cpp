@@ -16,7 +16,7 @@ namespace {
 constexpr int64_t kBytesBehind = 64;  // cleared, behind the last sample
 
 bool is_block_ratio(float ratio) {
-    return ratio == 4.0F || ratio == 3.0F || ratio == 1.0F || ratio == 2.0F;
+    return ratio == 4.0f || ratio == 3.0f || ratio == 1.0f || ratio == 2.0f;
 }
 
 int32_t run_blocks(const int16_t *pcm, int64_t count, int32_t source_rate, int32_t ana_rate,

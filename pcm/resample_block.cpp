@@ -16,7 +16,7 @@ int64_t block_start(float ratio, int64_t i, int64_t count) {
 }
 
 double block_mean(const int16_t *in, int64_t first, int64_t end) {
-    float sum = 0.0F;
+    float sum = 0.0f;
     for (int64_t k = first; k < end; ++k) sum += static_cast<float>(in[k]);
     return static_cast<double>(sum / static_cast<float>(end - first));
 }
