@@ -1,8 +1,8 @@
-#include "pcm/resample_sinc.h"
-
 #include <algorithm>
 #include <cmath>
 #include <cstring>
+
+#include "pcm/resample_engines.h"
 
 namespace {
 
