@@ -1,7 +1,7 @@
 #!/bin/sh
 # test-aarch64.sh [SONG...]: builds for AArch64 and runs the tests there, under qemu; among them the
-# one that compares each result with this machine's. SONGs, in any format that ffmpeg reads, are
-# compared as well.
+# golden results. SONGs, in any format that ffmpeg reads, are compared with this machine's results as
+# well.
 set -eu
 missing=
 for program in aarch64-linux-gnu-g++:g++-aarch64-linux-gnu qemu-aarch64:qemu-user \
@@ -14,22 +14,24 @@ if [ -n "$missing" ]; then
     # shellcheck disable=SC2086 # the packages are words
     DEBIAN_FRONTEND=noninteractive apt-get -qq -y install $missing >/dev/null
 fi
-
-root=$(cd "$(dirname "$0")/.." && pwd)
-songs=$root/build/release/results/songs
-rm -rf "$songs"
-mkdir -p "$songs"
-for song in "$@"; do
-    ffmpeg -nostdin -v error -i "$song" -c:a pcm_s16le -y "$songs/given_$(basename "$song").wav"
-done
-cd "$root"
+cd "$(dirname "$0")/.."
 scripts/aarch64-sysroot.sh
 
-# This machine's songs and results.
+# This machine's songs, which the tests there take.
 cmake --preset release
 cmake --build --preset release --target song_results make_song
-ctest --preset release -R '^results_'
+ctest --preset release -R '^songs$'
 
 cmake --preset aarch64
 cmake --build --preset aarch64
 ctest --preset aarch64 -j2
+
+[ $# -gt 0 ] || exit 0
+given=build/aarch64/given
+rm -rf "$given"
+mkdir -p "$given"
+for song in "$@"; do
+    ffmpeg -nostdin -v error -i "$song" -c:a pcm_s16le -y "$given/$(basename "$song").wav"
+done
+build/release/bin/song_results "$given" >"$given.json"
+qemu-aarch64 -L build/aarch64-sysroot build/aarch64/bin/song_results "$given" "$given.json"

@@ -1,17 +1,12 @@
 #!/usr/bin/env python3
 """The checks of this folder find what they are for."""
 import pathlib
-import shutil
 import subprocess
 import sys
 import tempfile
 import unittest
 
 HERE = pathlib.Path(__file__).parent
-RELIABILITY = HERE.parent.parent / "scripts" / "reliability.py"
-sys.path.insert(0, str(RELIABILITY.parent))
-import reliability  # noqa: E402: found through the line above
-
 LIBRARY, NAMES = sys.argv.pop(1), sys.argv.pop(1)
 
 
@@ -78,37 +73,6 @@ class Exports(unittest.TestCase):
         code, text = self.changed_list(lambda lines: lines + ["tavo_other"])
         self.assertEqual(code, 1)
         self.assertEqual(text, "listed, not exported: tavo_other\n")
-
-
-class Reliability(unittest.TestCase):
-    def test_figures_make_the_document(self):
-        root = pathlib.Path(tempfile.mkdtemp())
-        self.addCleanup(shutil.rmtree, root)
-        figures = root / "docs" / "figures"
-        figures.mkdir(parents=True)
-        for name, (_, sources, _) in reliability.SETS.items():
-            for source in sources:
-                with open(figures / f"{source}.txt", "a") as file:
-                    file.write(f"# 1 s\nfigure {name} case=a trials=1234 leaked=0\n")
-        for file, _ in reliability.NOTES.values():
-            (figures / file).write_text("place\treason\n")
-
-        self.assertEqual(check(RELIABILITY, root), (0, ""))
-        self.assertEqual(check(RELIABILITY, "--check", root), (0, ""))
-        document = root / "docs" / "RELIABILITY.md"
-        text = document.read_text()
-        self.assertIn("| a | 1,234 | 0 |", text)
-        self.assertIn("- `place`: reason", text)
-
-        document.write_text(text.replace("1,234", "1,235"))  # typed by hand
-        self.assertEqual(check(RELIABILITY, "--check", root)[0], 1)
-        one = figures / "limits.txt"
-        for wrong in ("", "# 1 s\n", "# 1 s\nfigure limits case=a trials=1 leaked=2\n",
-                      "# 1 s\nfigure limits a=1\nfigure limits b=1\n"):
-            one.write_text(wrong)
-            self.assertEqual(check(RELIABILITY, root)[0], 1, wrong)
-        one.unlink()
-        self.assertEqual(check(RELIABILITY, root)[0], 1)
 
 
 if __name__ == "__main__":

@@ -1,89 +1,59 @@
-// song_results SONGS OUT [REFERENCE]
-// Analyses every file in the directory SONGS in every mode and writes each result to OUT, all
-// digits of it. With REFERENCE, the file of another run or of another processor's build, the two
-// must be equal. Exit status: 0; 1 different, or a song without a result; 2 wrong usage.
-#include <algorithm>
-#include <cstdio>
+// song_results SONGS [EXPECTED]: analyses every file in the directory SONGS in every way and prints
+// the results as JSON, all digits of milliseconds and BPM. With EXPECTED, the results of another
+// run, it prints what differs instead. Exit status: 0; 1 different, or a song without a result; 2
+// wrong usage.
 #include <filesystem>
 #include <fstream>
+#include <iostream>
+#include <nlohmann/json.hpp>
 
 #include "tests/support/job_harness.h"
 
 namespace {
 
-// Adds one line for the result and one for each beat. False when there is none.
-bool add_result(const std::filesystem::path &song, int32_t mode, std::vector<std::string> &lines) {
+using nlohmann::json;
+
+struct way {
+    const char *name;
+    int32_t mode;
+    int32_t length;  // of the highlight, seconds; 0: none asked for
+};
+
+constexpr way kWays[] = {{"highlight", TAVO_MODE_HIGHLIGHT, 0},
+                         {"highlight of 20 s", TAVO_MODE_HIGHLIGHT, 20},
+                         {"beats", TAVO_MODE_BEATS, 0},
+                         {"both", TAVO_MODE_BOTH, 0}};
+
+json analyse(const std::string &path, const way &how) {
     int32_t err = TAVO_OK;
-    TAVO_CTX *ctx = job::create(song.string(), mode, &err);
-    if (ctx == nullptr || tavo_analyze(ctx, 0, 0, 0) != TAVO_OK) {
-        fprintf(stderr, "%s: mode %d: not analysed, %d\n", song.c_str(), mode, err);
-        return false;
-    }
+    TAVO_CTX *ctx = job::create(path, how.mode, &err);
+    if (ctx == nullptr || tavo_analyze(ctx, how.length, 0, 0) != TAVO_OK) return {{"refused", err}};
     const job::result result = job::wait();
-    std::string line = song.filename().string() + " mode " + std::to_string(mode) + " status " +
-                       std::to_string(result.status) + " highlight " +
-                       std::to_string(result.hl_pos);
-    if (ctx->onset != nullptr) {
-        line += " bpm " + std::to_string(ctx->onset->bpm) + " beats " +
-                std::to_string(result.beat_count);
-    }
-    lines.push_back(line);
-    for (const float beat : result.beats) {
-        char text[64];
-        snprintf(text, sizeof(text), "  %.9g", static_cast<double>(beat));
-        lines.emplace_back(text);
-    }
+    json found = {{"status", result.status}};
+    if (ctx->hl != nullptr) found["highlight_ms"] = result.hl_pos;
+    if (ctx->onset != nullptr) found["bpm"] = ctx->onset->bpm;
+    if (ctx->onset != nullptr) found["beats_ms"] = result.beats;
     tavo_deinit(ctx);
-    return true;
-}
-
-std::vector<std::string> read_lines(const char *path) {
-    std::vector<std::string> lines;
-    std::ifstream in(path);
-    for (std::string line; std::getline(in, line);) lines.push_back(line);
-    return lines;
-}
-
-bool write_lines(const char *path, const std::vector<std::string> &lines) {
-    std::ofstream out(path);
-    for (const std::string &line : lines) out << line << '\n';
-    return out.flush().good();
-}
-
-// Prints the first line that differs.
-bool same(std::vector<std::string> got, std::vector<std::string> expected) {
-    const size_t lines = std::max(got.size(), expected.size());
-    got.resize(lines, "(end)");
-    expected.resize(lines, "(end)");
-    const auto [one, other] = std::mismatch(got.begin(), got.end(), expected.begin());
-    if (one == got.end()) return true;
-    fprintf(stderr, "line %td: %s\ninstead of: %s\n", one - got.begin() + 1, one->c_str(),
-            other->c_str());
-    return false;
+    return found;
 }
 
 }  // namespace
 
 int main(int argc, char **argv) {
-    if (argc < 3 || argc > 4) return 2;
-    std::vector<std::filesystem::path> songs;
-    std::error_code error;
-    for (const auto &each : std::filesystem::directory_iterator(argv[1], error)) {
-        if (each.is_regular_file()) songs.push_back(each.path());
-    }
-    std::sort(songs.begin(), songs.end());
-
-    std::vector<std::string> lines;
-    bool all = !songs.empty();
-    for (const auto &song : songs) {
-        for (const int32_t mode : {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH}) {
-            all = add_result(song, mode, lines) && all;
+    if (argc < 2 || argc > 3) return 2;
+    json results;
+    for (const auto &song : std::filesystem::directory_iterator(argv[1])) {
+        for (const way &how : kWays) {
+            results[song.path().filename().string()][how.name] = analyse(song.path().string(), how);
         }
     }
-    printf("%zu songs, %zu lines of results\n", songs.size(), lines.size());
-    if (!write_lines(argv[2], lines)) {
-        perror(argv[2]);
-        return 1;
+    if (argc < 3) {
+        std::cout << results.dump(1) << '\n';
+        return results.empty() ? 1 : 0;
     }
-    return all && (argc < 4 || same(lines, read_lines(argv[3]))) ? 0 : 1;
+    std::ifstream in(argv[2]);
+    const json difference = json::diff(json::parse(in), results);
+    for (const json &each : difference) std::cout << each.dump() << '\n';
+    std::cout << results.size() << " songs, " << difference.size() << " values differ\n";
+    return results.empty() || !difference.empty() ? 1 : 0;
 }

@@ -1,7 +1,7 @@
 #!/bin/sh
 # make_songs.sh MAKE_SONG DIR: makes every song that the tests read, by make_song and Debian's encoders.
 # DIR/codec: every kind of stream and container. DIR/formats: one song in each format. DIR/short: songs
-# whose analysis takes milliseconds. DIR/jni, DIR/results: WAV files. Nothing is done when DIR is
+# whose analysis takes milliseconds. DIR/jni: WAV files. Nothing is done when DIR is
 # complete and newer than this script and MAKE_SONG.
 set -eu
 make_song=$1
@@ -137,16 +137,5 @@ END
 folder jni
 song song.wav --seconds 20 --bpm 120 --loud-at 6
 song clip.wav --seconds 2
-
-# Each way of converting the rate, one and four segments, slow to fast.
-folder results
-song stereo_120.wav --seconds 70 --bpm 120 --loud-at 24
-song mono_48k_87.wav --seconds 40 --bpm 87 --rate 48000 --channels 1
-song fast_173.wav --seconds 30 --bpm 173 --seed 2
-song slow_62.wav --seconds 45 --bpm 62 --rate 32000 --seed 3
-song block_2_140.wav --seconds 25 --bpm 140 --rate 22050
-song own_rate_100.wav --seconds 25 --bpm 100 --rate 11025 --channels 1
-song low_rate_95.wav --seconds 20 --bpm 95 --rate 8000 --channels 1
-song one_segment_130.wav --seconds 4.5 --bpm 130
 
 touch "$out/.complete"
