@@ -12,7 +12,7 @@ build=(
 java=(default-jdk-headless) # the bridge and the class for Java hosts
 tests=(
   libgtest-dev libbenchmark-dev
-  python3 clang-format clang-tidy
+  python3 python3-numpy clang-format clang-tidy
   ffmpeg flac lame vorbis-tools
   doxygen groff-base
 )

@@ -1,0 +1,94 @@
+"""Many songs, through the command tavo, whose worker processes run several at once."""
+
+from __future__ import annotations
+
+import json
+import os
+import subprocess
+import threading
+from typing import Callable, Iterable, Iterator, Optional, Union
+from urllib.parse import unquote_to_bytes
+
+import numpy as np
+
+from ._location import COMMAND
+from ._result import Path, Result, TavoError, check
+
+
+def analyze_many(
+    paths: Iterable[Path],
+    mode: str = "both",
+    length: int = 0,
+    max_beats: int = 0,
+    jobs: Optional[int] = None,
+    progress: Optional[Callable[[int, int], None]] = None,
+) -> Iterator[Union[Result, TavoError]]:
+    """Analyses songs at the same time and yields what comes of each, in the order of the paths.
+
+    A song that cannot be analysed is yielded as a TavoError, so that the others go on.
+    jobs: songs at once, each in a process of its own; None for one per processor.
+    progress: called after each song with the number done and the number of paths.
+    mode, length, max_beats: as for analyze. A path that is a folder stands for the songs in it.
+    """
+    check(mode, length, max_beats)
+    names = [os.fsencode(path) for path in paths]
+    return _run(names, mode, length, max_beats, jobs or os.cpu_count() or 1, progress)
+
+
+def _run(names, mode, length, max_beats, jobs, progress):
+    words = [COMMAND, "--format", "json", "--quiet", "--mode", mode, "--length", str(length),
+             "--max-beats", str(max_beats), "--jobs", str(jobs), "--null", "--files-from", "-"]
+    if mode == "beats":
+        words[words.index("--length"):words.index("--max-beats")] = []
+    if mode == "highlight":
+        words[words.index("--max-beats"):words.index("--jobs")] = []
+    command = subprocess.Popen(words, stdin=subprocess.PIPE, stdout=subprocess.PIPE,
+                               stderr=subprocess.DEVNULL)
+    feeder = threading.Thread(target=_feed, args=(command.stdin, names), daemon=True)
+    feeder.start()
+    done = 0
+    try:
+        for line in command.stdout:
+            done += 1
+            if progress is not None:
+                progress(done, len(names))
+            yield _parse(json.loads(line))
+        command.wait()
+    finally:
+        command.terminate()
+        command.wait()
+        command.stdout.close()
+        feeder.join()
+    if done < len(names):
+        raise RuntimeError(f"tavo ended after {done} of {len(names)} songs")
+
+
+def _feed(pipe, names):
+    try:
+        with pipe:
+            for name in names:
+                pipe.write(name + b"\0")
+    except BrokenPipeError:  # the command ended: _run tells
+        pass
+
+
+def _parse(song: dict) -> Union[Result, TavoError]:
+    path = unquote_to_bytes(song["file_bytes"]) if "file_bytes" in song else song["file"]
+    if song["status"] != "ok":
+        return TavoError(path, song["error"])
+    return Result(
+        path=os.fsdecode(path),
+        highlight_ms=song.get("hl_pos_ms"),
+        beats=np.array(song.get("beats_ms", []), dtype=np.float32).astype(np.float64) / 1000.0,
+        tempo_bpm=song.get("bpm"),
+        duration_s=song["duration_ms"] / 1000.0,
+        sample_rate=song["sample_rate"],
+    )
+
+
+def reason(name: bytes, mode: str) -> TavoError:
+    """Why a song could not be analysed, in the command's words."""
+    for end in _run([name], mode, 0, 0, 1, None):
+        if isinstance(end, TavoError):
+            return end
+    return TavoError(name, "The song could not be analysed.")
