@@ -1,14 +1,13 @@
 #include "beat/beat_ctx.h"
 
 #include "common/worker_group.h"
+#include "dsp/lanes.h"
 #include "dsp/mel.h"
 
 pthread_mutex_t *feat_mutex_mt = nullptr;
 pthread_cond_t *feat_cond_mt = nullptr;
 
 namespace {
-
-constexpr double kFullScale = 32767.0;  // ana holds samples on the 16-bit scale
 
 // Frames of frame_size samples that fit, one per hop; the division truncates toward zero, so that a
 // signal a little shorter than a frame still counts as one. That frame is never read.
@@ -66,37 +65,46 @@ void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float *
 }
 
 void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
+    prepare_beat_ctx(ctx, beat);
+    const int64_t n = analysis_length(ctx);
+    beat->signal = zeroed_items<double>(n);
+    beat->rise_flags = zeroed_items<int32_t>(n);
+    if (beat->signal != nullptr) scale_samples({ctx->ana, kFullScale}, n, beat->signal);
+}
+
+bool prepare_beat_ctx(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     worker_lock_create(&feat_mutex_mt, &feat_cond_mt);
 
     const int32_t frame_size = ctx->onset->frame_size;
     const int32_t hop_size = ctx->onset->hop_size;
-    const int64_t n = analysis_length(ctx);
     beat->band_count = kMelBands;
     beat->hop_seconds = static_cast<double>(hop_size) / ctx->ana_rate;
     beat->half_frame = frame_size > 0 ? frame_size / 2 : 0;
-    beat->frame_count = count_frames(n, frame_size, hop_size);
+    beat->frame_count = count_frames(analysis_length(ctx), frame_size, hop_size);
 
     beat->frame_times = zeroed_items<float>(beat->frame_count);
     beat->onset_env = zeroed_items<double>(beat->frame_count);
     beat->mel_matrix = alloc_rows(beat->half_frame, kMelBands);
-    beat->signal = zeroed_items<double>(n);
-    beat->rise_flags = zeroed_items<int32_t>(n);
     beat->threshold = zeroed_items<double>(beat->frame_count);
-    if (!beat_ctx_ready(beat)) return;
+    const bool ready = feat_mutex_mt != nullptr && feat_cond_mt != nullptr &&
+                       beat->frame_times != nullptr && beat->onset_env != nullptr &&
+                       beat->threshold != nullptr && beat->mel_matrix != nullptr &&
+                       all_rows_present(beat->mel_matrix, beat->half_frame);
+    if (!ready) return false;
 
-    const float hop = static_cast<float>(beat->hop_seconds);
+    const auto hop = static_cast<float>(beat->hop_seconds);
     for (int64_t k = 0; k < beat->frame_count; ++k) {
         beat->frame_times[k] = hop * static_cast<float>(k + 1);
     }
-    for (int64_t i = 0; i < n; ++i) beat->signal[i] = ctx->ana[i] / kFullScale;
     fft2melmtx(ctx->ana_rate, frame_size, ctx->ana_rate / 2, kMelBands, beat->mel_matrix);
+    return true;
 }
 
-bool beat_ctx_ready(const TAVO_BEAT_CTX *beat) {
-    return feat_mutex_mt != nullptr && feat_cond_mt != nullptr && beat->frame_times != nullptr &&
-           beat->onset_env != nullptr && beat->signal != nullptr && beat->rise_flags != nullptr &&
-           beat->threshold != nullptr && beat->mel_matrix != nullptr &&
-           all_rows_present(beat->mel_matrix, beat->half_frame);
+void scale_samples(sample_view view, int64_t count, double *to) {
+    const double_pair full_scale = {view.full_scale, view.full_scale};
+    int64_t i = 0;
+    for (; i + 1 < count; i += 2) store_pair(to + i, load_pair(view.samples + i) / full_scale);
+    if (i < count) to[i] = view.samples[i] / view.full_scale;
 }
 
 void __tavo_deinit(TAVO_BEAT_CTX *beat) {

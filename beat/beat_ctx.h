@@ -34,14 +34,22 @@ struct TAVO_BEAT_CTX {
 static_assert(offsetof(TAVO_BEAT_CTX, rise_flags) == 56 &&
               offsetof(TAVO_BEAT_CTX, band_count) == 88);
 
+// Samples of the analysis signal: divided by full_scale they lie between -1 and 1. An instance's
+// ana counts on the 16-bit scale, TAVO_BEAT_CTX.signal is divided already.
+struct sample_view {
+    const double *samples;
+    double full_scale;
+};
+
+constexpr double kFullScale = 32767.0;  // of ana
+
 extern "C" {
 
 // Serve both worker groups of this folder, from __beat_init to __tavo_deinit; else null.
 extern pthread_mutex_t *feat_mutex_mt;
 extern pthread_cond_t *feat_cond_mt;
 
-// Fills a zeroed context from the instance. When memory runs out it stays partly filled: see
-// beat_ctx_ready.
+// Fills a zeroed context from the instance. When memory runs out it stays partly filled.
 void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
 
 // Releases what hangs from the context, and the lock and condition; not the record itself.
@@ -52,12 +60,16 @@ void __tavo_deinit(TAVO_BEAT_CTX *beat);
 void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float **matrix);
 }
 
+// to[count] = the view's samples over its full scale.
+void scale_samples(sample_view view, int64_t count, double *to);
+
+// __beat_init without signal and rise_flags: for an analysis that reads ana itself. False when
+// memory runs out.
+bool prepare_beat_ctx(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
+
 // Samples of the analysis signal, 0 when there is none.
 inline int64_t analysis_length(const TAVO_CTX *ctx) {
     return ctx->ana != nullptr && ctx->ana_len > 0 ? ctx->ana_len : 0;
 }
-
-// True when __beat_init got all of its memory, the lock and the condition.
-bool beat_ctx_ready(const TAVO_BEAT_CTX *beat);
 
 #endif

@@ -17,17 +17,43 @@ outcome stop_asked(const TAVO_CTX *ctx) {
     return load_flag(&ctx->quit) != 0 ? stopped : going_on;
 }
 
-outcome find_rises(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
-    const int64_t n = analysis_length(ctx);
-    const int32_t rises = detectPowerVariation(beat->signal, beat->rise_flags, n);
-    if (rises < 0) return out_of_memory;
-    const int32_t code = collect_rise_frames(beat, n, ctx->onset->hop_size, rises);
-    return code == 0 ? going_on : out_of_memory;
+// The power rises of an instance, looked for beside the onset envelope.
+struct rise_search {
+    const TAVO_CTX *ctx;
+    int32_t count;     // -2 out of memory
+    int64_t *samples;  // [count] owned
+};
+
+sample_view view_of(const TAVO_CTX *ctx) {
+    return {ctx->ana, kFullScale};
 }
 
-outcome take_onsets(const TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
-    _getOnsetEnvelope(beat, onset->frame_size, onset->hop_size);
+void search_rises(void *arg) {
+    auto *search = static_cast<rise_search *>(arg);
+    const TAVO_CTX *ctx = search->ctx;
+    search->count = find_power_rises(view_of(ctx), analysis_length(ctx), &search->samples);
+}
+
+outcome keep_rises(const rise_search *search, int32_t hop_size, TAVO_BEAT_CTX *beat) {
+    if (search->count < 0) return out_of_memory;
+    if (search->count == 0 || hop_size < 1) return going_on;
+    beat->rise_frames = zeroed_items<int32_t>(search->count);
+    if (beat->rise_frames == nullptr) return out_of_memory;
+    beat->rise_count = search->count;
+    for (int32_t k = 0; k < search->count; ++k) {
+        beat->rise_frames[k] = static_cast<int32_t>(search->samples[k] / hop_size);
+    }
     return going_on;
+}
+
+outcome take_onsets_and_rises(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
+    const TAVO_ONSET_CTX *onset = ctx->onset;
+    rise_search search = {ctx, 0, nullptr};
+    const side_work beside = {search_rises, &search};
+    fill_onset_envelope(beat, view_of(ctx), onset->frame_size, onset->hop_size, &beside);
+    const outcome end = keep_rises(&search, onset->hop_size, beat);
+    free(search.samples);
+    return end;
 }
 
 outcome find_tempo(TAVO_ONSET_CTX *onset, const TAVO_BEAT_CTX *beat) {
@@ -57,14 +83,12 @@ outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
 }
 
 outcome analyse(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
-    outcome end = find_rises(ctx, beat);
-    if (end == going_on) end = stop_asked(ctx);
-    if (end == going_on) end = take_onsets(ctx->onset, beat);
+    outcome end = stop_asked(ctx);
+    if (end == going_on) end = take_onsets_and_rises(ctx, beat);
     if (end == going_on) end = find_tempo(ctx->onset, beat);
     if (end == going_on) end = stop_asked(ctx);
     if (end == going_on) end = find_beats(ctx->onset, beat);
-    if (end == going_on)
-        write_click_track(beat->signal, analysis_length(ctx), ctx->ana_rate, ctx->onset);
+    if (end == going_on) write_click_track(ctx);
     return end;
 }
 
@@ -83,8 +107,7 @@ int32_t getBeatPosition(TAVO_CTX *ctx) {
     TAVO_BEAT_CTX *beat = zeroed_items<TAVO_BEAT_CTX>(1);
     if (beat == nullptr) return 0;
 
-    __beat_init(ctx, beat);
-    if (beat_ctx_ready(beat) && analyse(ctx, beat) == going_on) {
+    if (prepare_beat_ctx(ctx, beat) && analyse(ctx, beat) == going_on) {
         store_flag(&ctx->state, kStateFinished);
     }
     __tavo_deinit(beat);

@@ -17,7 +17,6 @@ constexpr double kTwoPi = 6.283185307179586;
 constexpr double kBlipHz = 4000.0;
 constexpr double kBlipScale = 160.0;  // brings the blip's top to about a quarter
 constexpr float kBlipSeconds = 0.1f;
-constexpr double kFullScale = 32767.0;
 constexpr double kBlipGain = 2.5;
 constexpr int32_t kChunk = 2048;  // samples written at once
 
@@ -76,12 +75,13 @@ uint32_t mix_sample(double signal, float blip) {
     return static_cast<uint32_t>(static_cast<int32_t>(mixed)) & 0xFFFF;
 }
 
-void write_samples(const double *signal, const float *track, int64_t n, FILE *stream) {
+void write_samples(const double *ana, const float *track, int64_t n, FILE *stream) {
     uint8_t bytes[kChunk * kFileSampleBytes];
     for (int64_t done = 0; done < n; done += kChunk) {
         const int64_t count = n - done < kChunk ? n - done : kChunk;
         for (int64_t i = 0; i < count; ++i) {
-            put_u16(bytes + i * kFileSampleBytes, mix_sample(signal[done + i], track[done + i]));
+            put_u16(bytes + i * kFileSampleBytes,
+                    mix_sample(ana[done + i] / kFullScale, track[done + i]));
         }
         fwrite(bytes, kFileSampleBytes, static_cast<size_t>(count), stream);
     }
@@ -118,17 +118,19 @@ void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, flo
 
 // The memory comes before the file, so that a file is never begun that cannot be finished, and the
 // blips after it, so that a host that wants no file does not pay for them.
-void write_click_track(const double *signal, int64_t n, int32_t sr, const TAVO_ONSET_CTX *onset) {
+void write_click_track(const TAVO_CTX *ctx) {
     if (fnamedec == nullptr || fnamedec[0] == '\0') return;
+    const int64_t n = analysis_length(ctx);
+    const int32_t sr = ctx->ana_rate;
     const int32_t length = blip_length(sr);
     float *blip = zeroed_items<float>(length);
     float *track = zeroed_items<float>(n);
     FILE *stream = blip != nullptr && track != nullptr ? fopen(fnamedec, "wb") : nullptr;
     if (stream != nullptr) {
         make_blip(sr, length, blip);
-        lay_blips(blip, length, onset->beat_times, onset->beat_count, sr, n, track);
+        lay_blips(blip, length, ctx->onset->beat_times, ctx->onset->beat_count, sr, n, track);
         makeWaveHeader(static_cast<uint32_t>(n), stream);
-        write_samples(signal, track, n, stream);
+        write_samples(ctx->ana, track, n, stream);
         fclose(stream);
     }
     free(blip);

@@ -17,7 +17,8 @@ int32_t makeWaveHeader(uint32_t n, FILE *stream);
 void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, float *track);
 }
 
-// Renders and writes the click track of signal[n] (scaled to 1) when fnamedec can be created.
-void write_click_track(const double *signal, int64_t n, int32_t sr, const TAVO_ONSET_CTX *onset);
+// Renders and writes the click track of the instance's analysis signal and beats when fnamedec can
+// be created; does nothing else.
+void write_click_track(const TAVO_CTX *ctx);
 
 #endif

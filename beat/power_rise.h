@@ -1,6 +1,8 @@
-// Stage 4, before the onset envelope: the places where the music becomes loud after at least a
+// Stage 4, beside the onset envelope: the places where the music becomes loud after at least a
 // second of relative quiet.
-// In: TAVO_BEAT_CTX.signal. Out: rise_flags, rise_frames, rise_count. After: beat/candidates.h.
+//
+// In: the analysis signal. Out: the samples where rises start. After: beat/candidates.h, which
+// takes their frames.
 #ifndef TAVO_BEAT_POWER_RISE_H
 #define TAVO_BEAT_POWER_RISE_H
 
@@ -13,8 +15,8 @@ extern "C" {
 int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n);
 }
 
-// Turns the count rises flagged among n samples into rise_frames and rise_count. Returns 0; -2 out
-// of memory.
-int32_t collect_rise_frames(TAVO_BEAT_CTX *beat, int64_t n, int32_t hop_size, int32_t count);
+// The same rises among the n samples of a view, as *samples, ascending, to be freed by the caller
+// whatever is returned. Returns how many; -2 out of memory.
+int32_t find_power_rises(sample_view view, int64_t n, int64_t **samples);
 
 #endif

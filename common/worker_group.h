@@ -28,11 +28,17 @@ struct worker_slot {
 void worker_group_done(pthread_mutex_t *mutex, pthread_cond_t *cond, int32_t *done, int32_t count,
                        int32_t index);
 
-// Clears the done flags, starts the count (at most 4) workers in order, waits until every flag is
-// set and joins the threads. The body of a worker whose thread cannot be started runs on the
-// calling thread.
+// What the calling thread does while a group works.
+struct side_work {
+    void (*run)(void *arg);
+    void *arg;
+};
+
+// Clears the done flags, starts the count (at most 4) workers in order, does the work of beside
+// (null for none), waits until every flag is set and joins the threads. The body of a worker whose
+// thread cannot be started runs on the calling thread.
 void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *mutex,
-                      pthread_cond_t *cond, int32_t *done);
+                      pthread_cond_t *cond, int32_t *done, const side_work *beside = nullptr);
 
 // Allocate and initialise a lock and its condition into the two globals. Returns 0; -2 with both
 // null.
