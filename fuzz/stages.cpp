@@ -283,7 +283,7 @@ void place_beats(fuzz::input *in) {
     analysis run(&silence);
     __beat_init(&run.ctx, &run.beat);
     TAVO_BEAT_CTX *beat = &run.beat;
-    must(beat_ctx_ready(beat) && beat->frame_count == static_cast<int64_t>(frames),
+    must(beat->signal != nullptr && beat->frame_count == static_cast<int64_t>(frames),
          "a context is made");
     std::vector<double> env(frames);
     for (size_t k = 0; k + 1 < frames; ++k)
