@@ -1,18 +1,11 @@
 #include "core/jobs.h"
 
-#include <cstdlib>
-
 #include "beat/beats.h"
 #include "highlight/position.h"
-#include "pcm/decode.h"
 #include "pcm/from_highlight.h"
-#include "pcm/resample.h"
+#include "pcm/song.h"
 
 namespace {
-
-void decode(TAVO_CTX *ctx) {
-    ctx->pcm_bytes = DecodePcmMT(ctx, ctx->pcm, ctx->pcm_bytes);
-}
 
 void deliver(TAVO_CTX *ctx) {
     if (ctx->callback != nullptr) ctx->callback(ctx->info);
@@ -50,7 +43,7 @@ void find_and_report_beats(TAVO_CTX *ctx, bool from_highlight, bool converted) {
 
 extern "C" void *analyzeHighlightOnly(void *arg) {
     auto *ctx = static_cast<TAVO_CTX *>(arg);
-    decode(ctx);
+    decode_song(ctx);
     getHLPosition(ctx);
     store_flag(&ctx->state, kStateFinished);
     ctx->info->hl_pos = static_cast<int32_t>(ctx->hl->hl_pos);
@@ -65,18 +58,15 @@ extern "C" void *analyzeHighlight(void *arg) {
 
 extern "C" void *analyzeOnsetOnly(void *arg) {
     auto *ctx = static_cast<TAVO_CTX *>(arg);
-    decode(ctx);
-    const int32_t code = dorn_resampler_run(ctx->pcm, ctx->pcm_bytes, ctx->fmt.sample_rate,
-                                            ctx->ana_rate, &ctx->ana_len, &ctx->ana);
-    free(ctx->pcm);
-    ctx->pcm = nullptr;
+    decode_song(ctx);
+    const int32_t code = convert_song(ctx, 0);
     find_and_report_beats(ctx, false, code == 0);
     pthread_exit(nullptr);
 }
 
 extern "C" void *analyzeOnsetFromeHi(void *arg) {
     auto *ctx = static_cast<TAVO_CTX *>(arg);
-    decode(ctx);
+    decode_song(ctx);
     const int64_t start_ms = getHLPosition(ctx);
     const int32_t code = tavo_get_from_here(ctx, start_ms);
     find_and_report_beats(ctx, true, code == 0);

@@ -58,6 +58,7 @@ int32_t place_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_l
     // At least one byte: an empty request may be answered by null.
     seg->buf = static_cast<uint8_t *>(malloc(static_cast<size_t>(std::max<int64_t>(seg->cap, 1))));
     if (seg->buf == nullptr) return TAVO_ERR_MEMORY;
+    advise_huge_pages(seg->buf, seg->cap);
 
     seg->seek_pos = start;  // stands when the seek fails without reporting a position
     mtsrc_seekstream(seg->src, start, &seg->seek_pos);
@@ -70,19 +71,19 @@ int32_t make_pcm(TAVO_CTX *ctx, int64_t units) {
     if (!span_bytes(units, ctx->fmt.sample_rate, &bytes) || bytes == 0) return TAVO_ERR_MEMORY;
     ctx->pcm = static_cast<int16_t *>(calloc(static_cast<size_t>(bytes), 1));
     if (ctx->pcm == nullptr) return TAVO_ERR_MEMORY;
+    advise_huge_pages(ctx->pcm, bytes);
     ctx->pcm_bytes = bytes;
     return 0;
 }
 
 // The table of seg_count cleared records that share one array of done flags.
 int32_t make_table(TAVO_CTX *ctx, const mtsrc_param *open_param) {
-    const auto count = static_cast<size_t>(ctx->seg_count);
-    ctx->seg = static_cast<TAVO_DECSEG *>(calloc(count, sizeof(TAVO_DECSEG)));
+    ctx->seg = zeroed_items<TAVO_DECSEG>(ctx->seg_count);
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
-    auto *done = static_cast<int32_t *>(calloc(count, sizeof(int32_t)));
+    auto *done = zeroed_items<int32_t>(ctx->seg_count);
     if (done == nullptr) return TAVO_ERR_MEMORY;
 
-    for (size_t i = 0; i < count; ++i) {
+    for (int32_t i = 0; i < ctx->seg_count; ++i) {
         TAVO_DECSEG *seg = &ctx->seg[i];
         seg->done = done;
         seg->mutex = ext_mutex_mt;

@@ -2,12 +2,11 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <cstring>
 
 #include "common/alloc.h"
 #include "pcm/block_search.h"
 #include "pcm/read_pcm.h"
-#include "pcm/resample.h"
+#include "pcm/song.h"
 #include "pcm/stitch.h"
 
 namespace {
@@ -68,26 +67,13 @@ int64_t planned_bytes(const TAVO_DECSEG *seg) {
 
 // Discards the decoding and decodes the stream again from start (100-ns units).
 int32_t decode_again(TAVO_CTX *ctx, int64_t start) {
-    for (int32_t i = 0; i < ctx->seg_count; ++i) {
-        free(ctx->seg[i].buf);
-        ctx->seg[i].buf = nullptr;
-    }
+    for (int32_t i = 0; i < ctx->seg_count; ++i) free_segment_buffer(&ctx->seg[i]);
     free(ctx->pcm);
     ctx->pcm = nullptr;
 
     const int32_t err = construct_decbuf(ctx, start);
-    if (err == 0) ctx->pcm_bytes = DecodePcmMT(ctx, ctx->pcm, ctx->pcm_bytes);
+    if (err == 0) decode_song(ctx);
     return err;
-}
-
-// Where pcm begins when off bytes of it are left out, at an address that holds whole samples.
-// *bytes: the bytes from there on.
-const int16_t *pcm_from(int16_t *pcm, int64_t pcm_bytes, int64_t off, int64_t *bytes) {
-    *bytes = std::max<int64_t>(pcm_bytes - off, 0);
-    if (off % kBytesPerSample == 0) return pcm + off / kBytesPerSample;
-    auto *first = reinterpret_cast<uint8_t *>(pcm);
-    memmove(first, first + off, static_cast<size_t>(*bytes));
-    return pcm;
 }
 
 // Seeks to pos (milliseconds), stores the landing point as the highlight and finds it in the
@@ -124,13 +110,5 @@ int32_t tavo_get_from_here(TAVO_CTX *ctx, int64_t pos) {
     } else {
         err = settle_start(ctx, pos, &off);
     }
-    if (err == 0) {
-        int64_t bytes = 0;
-        const int16_t *from = pcm_from(ctx->pcm, ctx->pcm_bytes, off, &bytes);
-        err = dorn_resampler_run(from, bytes, ctx->fmt.sample_rate, ctx->ana_rate, &ctx->ana_len,
-                                 &ctx->ana);
-    }
-    free(ctx->pcm);
-    ctx->pcm = nullptr;
-    return err;
+    return err == 0 ? convert_song(ctx, off) : err;
 }

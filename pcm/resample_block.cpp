@@ -1,11 +1,18 @@
+#include <algorithm>
 #include <cstdlib>
+#include <cstring>
 
+#include "common/alloc.h"
 #include "common/worker_group.h"
-#include "pcm/resample.h"
+#include "pcm/resample_engines.h"
 
 namespace {
 
 constexpr int32_t kParts = 4;
+constexpr int32_t kExactFloats = 1 << 24;  // whole numbers up to here are exact as floats
+
+using vec_f32 = float __attribute__((vector_size(16)));
+using vec_i32 = int32_t __attribute__((vector_size(16)));
 
 // First input sample of output i, at most count. Single precision on purpose: the blocks of long
 // signals follow its rounding.
@@ -16,26 +23,89 @@ int64_t block_start(float ratio, int64_t i, int64_t count) {
 }
 
 double block_mean(const int16_t *in, int64_t first, int64_t end) {
-    float sum = 0.0F;
+    float sum = 0.0f;
     for (int64_t k = first; k < end; ++k) sum += static_cast<float>(in[k]);
     return static_cast<double>(sum / static_cast<float>(end - first));
+}
+
+// Any blocks.
+void average_blocks(const RESAMPLE_PART *part, int64_t first, int64_t end) {
+    for (int64_t i = first; i < end; ++i) {
+        const int64_t from = block_start(part->ratio, i, part->in_count);
+        const int64_t to = block_start(part->ratio, i + 1, part->in_count);
+        if (from < to) {
+            part->out[i] = block_mean(part->in, from, to);
+        } else {  // rounding left no block: the sample there, or the last one
+            part->out[i] = part->in[std::min(from, part->in_count - 1)];
+        }
+    }
+}
+
+// Blocks of exactly kWhole samples. Their sums are exact in single precision and so are the same as
+// integers. out may be the memory of in when kWhole is 4: a step is read before it is written.
+template <int32_t kWhole>
+void average_whole(const int16_t *in, double *out, int64_t first, int64_t end) {
+    constexpr int32_t kStep = 64;  // outputs
+    int16_t block[kStep * kWhole];
+    while (first < end) {
+        const auto outputs = static_cast<int32_t>(std::min<int64_t>(end - first, kStep));
+        memcpy(block, in + first * kWhole, static_cast<size_t>(outputs) * kWhole * sizeof *in);
+        for (int32_t i = 0; i < outputs; ++i) {
+            int32_t sum = 0;
+            for (int32_t k = 0; k < kWhole; ++k) sum += block[i * kWhole + k];
+            out[first + i] =
+                static_cast<double>(static_cast<float>(sum) / static_cast<float>(kWhole));
+        }
+        first += outputs;
+    }
+}
+
+// Blocks of four, four outputs side by side.
+void average_fours(const int16_t *in, double *out, int64_t first, int64_t end) {
+    for (; first + 4 <= end; first += 4) {
+        vec_i32 a;  // two samples in each lane
+        vec_i32 b;
+        memcpy(&a, in + first * 4, sizeof a);
+        memcpy(&b, in + first * 4 + 8, sizeof b);
+        const vec_i32 pairs_a = ((a << 16) >> 16) + (a >> 16);
+        const vec_i32 pairs_b = ((b << 16) >> 16) + (b >> 16);
+        const vec_i32 sums = __builtin_shufflevector(pairs_a, pairs_b, 0, 2, 4, 6) +
+                             __builtin_shufflevector(pairs_a, pairs_b, 1, 3, 5, 7);
+        const vec_f32 means = __builtin_convertvector(sums, vec_f32) / 4.0f;
+        const double wide[4] = {means[0], means[1], means[2], means[3]};
+        memcpy(out + first, wide, sizeof wide);
+    }
+    average_whole<4>(in, out, first, end);
 }
 
 void average_part(void *record) {
     const auto *part = static_cast<RESAMPLE_PART *>(record);
     if (part->in_count < 1) return;
-    for (int64_t i = part->first; i < part->end; ++i) {
-        const int64_t first = block_start(part->ratio, i, part->in_count);
-        const int64_t end = block_start(part->ratio, i + 1, part->in_count);
-        if (first < end) {
-            part->out[i] = block_mean(part->in, first, end);
-        } else {  // rounding left no block: the sample there, or the last one
-            part->out[i] = part->in[first < part->in_count ? first : part->in_count - 1];
-        }
+    const int32_t whole = whole_ratio(part->ratio);
+    int64_t exact = part->first;  // end of the outputs whose blocks have exactly whole samples
+    if (whole > 0 && part->first >= 0) {
+        exact = std::min({part->end, exact_blocks(whole), part->in_count / whole});
+        exact = std::max(exact, part->first);
     }
+    if (whole == 1) average_whole<1>(part->in, part->out, part->first, exact);
+    if (whole == 2) average_whole<2>(part->in, part->out, part->first, exact);
+    if (whole == 3) average_whole<3>(part->in, part->out, part->first, exact);
+    if (whole == 4) average_fours(part->in, part->out, part->first, exact);
+    average_blocks(part, exact, part->end);
 }
 
 }  // namespace
+
+int32_t whole_ratio(float ratio) {
+    for (int32_t whole = 1; whole <= kMaxWholeRatio; ++whole) {
+        if (ratio == static_cast<float>(whole)) return whole;
+    }
+    return 0;
+}
+
+int64_t exact_blocks(int32_t whole) {
+    return whole == 3 ? kExactFloats / 3 : kExactFloats;
+}
 
 void resampleMT_thd_cleanup(void *part) {
     const auto *self = static_cast<RESAMPLE_PART *>(part);
@@ -46,16 +116,11 @@ void *_resampleMT(void *part) {
     run_worker(part, average_part, resampleMT_thd_cleanup);
 }
 
-void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, double *out,
-                       int64_t n, int32_t ana_rate) {
-    if (source_rate < 1 || ana_rate < 1) return;
-    // A direct caller may not have made the lock that dorn_resampler_run makes.
-    const bool make_lock = ext_mutex_resample == nullptr;
-    if (make_lock && worker_lock_create(&ext_mutex_resample, &ext_cond_resample) != 0) return;
-
-    auto *parts = static_cast<RESAMPLE_PART *>(calloc(kParts, sizeof(RESAMPLE_PART)));
-    auto *done = static_cast<int32_t *>(calloc(kParts, sizeof(int32_t)));
-    if (parts != nullptr && done != nullptr) {
+bool average_on_threads(const int16_t *in, int64_t count, float ratio, double *out, int64_t n) {
+    auto *parts = zeroed_items<RESAMPLE_PART>(kParts);
+    auto *done = zeroed_items<int32_t>(kParts);
+    const bool ready = parts != nullptr && done != nullptr;
+    if (ready) {
         worker_slot slots[kParts] = {};
         const int64_t share = n / kParts;
         for (int32_t i = 0; i < kParts; ++i) {
@@ -63,7 +128,7 @@ void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, do
             part->index = i;
             part->in = in;
             part->out = out;
-            part->ratio = static_cast<float>(source_rate) / static_cast<float>(ana_rate);
+            part->ratio = ratio;
             part->first = i * share;
             part->end = i == kParts - 1 ? n : (i + 1) * share;
             part->in_count = count;
@@ -78,5 +143,16 @@ void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, do
     }
     free(done);
     free(parts);
+    return ready;
+}
+
+void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, double *out,
+                       int64_t n, int32_t ana_rate) {
+    if (source_rate < 1 || ana_rate < 1) return;
+    // A direct caller may not have made the lock that dorn_resampler_run makes.
+    const bool make_lock = ext_mutex_resample == nullptr;
+    if (make_lock && worker_lock_create(&ext_mutex_resample, &ext_cond_resample) != 0) return;
+    const float ratio = static_cast<float>(source_rate) / static_cast<float>(ana_rate);
+    average_on_threads(in, count, ratio, out, n);
     if (make_lock) worker_lock_release(&ext_mutex_resample, &ext_cond_resample);
 }

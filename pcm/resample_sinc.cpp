@@ -1,29 +1,35 @@
-#include "pcm/resample_sinc.h"
-
 #include <algorithm>
 #include <cmath>
+#include <cstring>
+
+#include "pcm/resample_engines.h"
 
 namespace {
 
 constexpr double kPi = 3.141592653589793;
-constexpr int32_t kTapsWhole = 20;  // ratio within kWholeRatio of a whole number
+constexpr int32_t kTapsWhole = 20;  // for a ratio within kWholeRatio of a whole number
 constexpr int32_t kTapsOther = 19;
 constexpr double kWholeRatio = 0.0001;
-constexpr double kEdgeDown = 0.9;             // cut-off, of the output's Nyquist frequency
-constexpr double kEdgeUp = 0.99;              // cut-off limit, of the input's Nyquist frequency
+constexpr double kEdgeDown = 0.9;             // cut-off as a part of the output's Nyquist frequency
+constexpr double kEdgeUp = 0.99;              // upper limit, as a part of the input's
 constexpr double kCentre = 1e-9;              // nearer to the sinc's centre: its limit value
 constexpr double kPhaseSteps = 960.0;         // phases per input sample
 constexpr double kMiddlePhase = 480.0;        // the phase without a fractional offset
-constexpr double kFracLimit = 0.500001;       // half a sample and rounding
-constexpr float kRatioLimit = 2147483648.0F;  // no rate reaches it
-constexpr int32_t kLanes = 4;                 // outputs summed side by side, each in tap order
+constexpr double kFracLimit = 0.500001;       // half a sample and some rounding
+constexpr float kRatioLimit = 2147483648.0f;  // no pair of rates reaches it
+
+constexpr int32_t kLanes = 4;
+using vec_f32 = float __attribute__((vector_size(16)));
+using vec_i16 = int16_t __attribute__((vector_size(16)));
+using vec_i32 = int32_t __attribute__((vector_size(16)));
+using vec_i64 = int64_t __attribute__((vector_size(16)));
 
 // Coefficient of tap k for the fractional offset f, cut-off wc. Which steps are single precision
 // and which double is part of the result.
 float tap_coefficient(int32_t taps, int32_t k, float f, float wc) {
     const auto span = static_cast<float>(taps);
-    const float t = std::clamp(static_cast<float>(k) - f, 0.0F, span);
-    const float x = t - span / 2.0F;
+    const float t = std::clamp(static_cast<float>(k) - f, 0.0f, span);
+    const float x = t - span / 2.0f;
     if (std::fabs(static_cast<double>(x)) < kCentre) {
         return static_cast<float>(static_cast<double>(wc) / kPi);
     }
@@ -45,35 +51,37 @@ enum class placed { inside, past_end, bad_phase };
 
 placed place_frame(const dorn_resampler_state &state, int64_t j, int32_t in_len,
                    frame_place *place) {
-    const float half = static_cast<float>(state.taps) / 2.0F;
-    const float pos = state.ratio * static_cast<float>(j);  // single precision by design
-    const auto base = static_cast<float>(std::floor(static_cast<double>(pos)));
+    const float half = static_cast<float>(state.taps) / 2.0f;
+    const float pos = state.ratio * static_cast<float>(j);  // single precision on purpose
+    const auto base = static_cast<float>(static_cast<int64_t>(pos));
     const float last = (half + base) * static_cast<float>(state.channels);
     if (static_cast<double>(last) >= static_cast<double>(in_len)) return placed::past_end;
 
     const double middle = static_cast<double>(base) + (state.taps % 2 != 0 ? 0.5 : 0.0);
     const auto frac = static_cast<float>(static_cast<double>(pos) - middle);
     if (std::fabs(static_cast<double>(frac)) > kFracLimit) return placed::bad_phase;
-    const double phase = std::floor(kPhaseSteps * static_cast<double>(frac) + kMiddlePhase + 0.5);
+    const double phase = kPhaseSteps * static_cast<double>(frac) + kMiddlePhase + 0.5;
 
     place->first = static_cast<int64_t>(base) - static_cast<int64_t>(half);
     place->row = state.coef[static_cast<int32_t>(phase)];
     return placed::inside;
 }
 
-// The low 16 bits of the rounded sum: a sum beyond 16 bits wraps.
+// The low 16 bits of the sum rounded to the nearest integer, halves up. A larger sum wraps.
 int16_t wrap_sample(float acc) {
     constexpr double kInt64Limit = 9.2e18;
-    const double rounded = std::floor(static_cast<double>(acc) + 0.5);
-    if (!(std::fabs(rounded) < kInt64Limit)) return 0;
-    return static_cast<int16_t>(static_cast<uint16_t>(static_cast<int64_t>(rounded)));
+    const double value = static_cast<double>(acc) + 0.5;
+    if (!(std::fabs(value) < kInt64Limit)) return 0;
+    auto rounded = static_cast<int64_t>(value);
+    rounded -= static_cast<double>(rounded) > value ? 1 : 0;  // toward minus infinity
+    return static_cast<int16_t>(static_cast<uint16_t>(rounded));
 }
 
-// Any frame: places outside the input count as 0.
+// Any frame. Places outside the input count as 0.
 void filter_edge(const dorn_resampler_state &state, const frame_place &place, const int16_t *in,
                  int32_t in_len, int16_t *out) {
     for (int32_t c = 0; c < state.channels; ++c) {
-        float acc = 0.0F;
+        float acc = 0.0f;
         for (int32_t k = 0; k <= state.taps; ++k) {
             const int64_t at = (place.first + k) * state.channels + c;
             const bool present = at >= 0 && at < in_len;
@@ -83,32 +91,54 @@ void filter_edge(const dorn_resampler_state &state, const frame_place &place, co
     }
 }
 
-// kLanes mono frames wholly inside the input. A sum waits for the one before it at every tap: four
-// of them in flight fill that time.
+// Four taps of one frame: its samples as floats, weighted.
+vec_f32 weigh_taps(const float *row, const int16_t *in) {
+    int64_t four = 0;
+    memcpy(&four, in, sizeof four);
+    const auto packed = reinterpret_cast<vec_i16>(vec_i64{four, 0});
+    const auto twice = __builtin_shufflevector(packed, packed, 0, 0, 1, 1, 2, 2, 3, 3);
+    const vec_i32 samples = reinterpret_cast<vec_i32>(twice) >> 16;
+    vec_f32 weights;
+    memcpy(&weights, row, sizeof weights);
+    return weights * __builtin_convertvector(samples, vec_f32);
+}
+
+// kLanes mono frames wholly inside the input, side by side. Each lane of the sum takes the taps of
+// its frame in their order, so it has the bits of filter_edge.
 void filter_inside(int32_t taps, const frame_place *place, const int16_t *in, int16_t *out) {
     const int16_t *const in0 = in + place[0].first;
     const int16_t *const in1 = in + place[1].first;
     const int16_t *const in2 = in + place[2].first;
     const int16_t *const in3 = in + place[3].first;
-    float acc0 = 0.0F;
-    float acc1 = 0.0F;
-    float acc2 = 0.0F;
-    float acc3 = 0.0F;
-    for (int32_t k = 0; k <= taps; ++k) {
-        acc0 += place[0].row[k] * static_cast<float>(in0[k]);
-        acc1 += place[1].row[k] * static_cast<float>(in1[k]);
-        acc2 += place[2].row[k] * static_cast<float>(in2[k]);
-        acc3 += place[3].row[k] * static_cast<float>(in3[k]);
+    vec_f32 acc = {};
+    int32_t k = 0;
+    for (; k + kLanes <= taps + 1; k += kLanes) {
+        const vec_f32 a = weigh_taps(place[0].row + k, in0 + k);
+        const vec_f32 b = weigh_taps(place[1].row + k, in1 + k);
+        const vec_f32 c = weigh_taps(place[2].row + k, in2 + k);
+        const vec_f32 d = weigh_taps(place[3].row + k, in3 + k);
+        // From four taps of a frame in a vector to four frames of a tap in a vector.
+        const vec_f32 ab_low = __builtin_shufflevector(a, b, 0, 4, 1, 5);
+        const vec_f32 ab_high = __builtin_shufflevector(a, b, 2, 6, 3, 7);
+        const vec_f32 cd_low = __builtin_shufflevector(c, d, 0, 4, 1, 5);
+        const vec_f32 cd_high = __builtin_shufflevector(c, d, 2, 6, 3, 7);
+        acc += __builtin_shufflevector(ab_low, cd_low, 0, 1, 4, 5);
+        acc += __builtin_shufflevector(ab_low, cd_low, 2, 3, 6, 7);
+        acc += __builtin_shufflevector(ab_high, cd_high, 0, 1, 4, 5);
+        acc += __builtin_shufflevector(ab_high, cd_high, 2, 3, 6, 7);
     }
-    out[0] = wrap_sample(acc0);
-    out[1] = wrap_sample(acc1);
-    out[2] = wrap_sample(acc2);
-    out[3] = wrap_sample(acc3);
+    for (; k <= taps; ++k) {
+        const vec_i32 samples = {in0[k], in1[k], in2[k], in3[k]};
+        const vec_f32 weights = {place[0].row[k], place[1].row[k], place[2].row[k],
+                                 place[3].row[k]};
+        acc += weights * __builtin_convertvector(samples, vec_f32);
+    }
+    for (int32_t lane = 0; lane < kLanes; ++lane) out[lane] = wrap_sample(acc[lane]);
 }
 
 bool usable(const dorn_resampler_state &state) {
     return state.taps >= 0 && state.taps < kResampleRow && state.channels > 0 &&
-           state.ratio > 0.0F && state.ratio < kRatioLimit;
+           state.ratio > 0.0f && state.ratio < kRatioLimit;
 }
 
 }  // namespace
@@ -128,7 +158,7 @@ int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int
             if (status != placed::inside) break;
             ++lanes;
         }
-        // Places ascend, so the first and the last tell for all.
+        // Places ascend: the first and the last speak for all.
         if (channels == 1 && lanes == kLanes && place[0].first >= 0 &&
             place[kLanes - 1].first + state->taps < in_len) {
             filter_inside(state->taps, place, in, out + j);

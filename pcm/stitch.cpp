@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "pcm/block_search.h"
+#include "pcm/song.h"
 
 namespace {
 
@@ -15,10 +16,8 @@ int64_t find_seam(const uint8_t *dst, int64_t total, const uint8_t *data, int64_
     return seam == kNoPlace ? total : seam;
 }
 
-}  // namespace
-
-int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
-                        int64_t capacity) {
+int64_t copy_segments(TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst, int64_t capacity,
+                      bool keep) {
     const int64_t skip = second_bytes(rate);
     if (dst == nullptr || capacity < 1 || skip < 1) return 0;
 
@@ -35,7 +34,17 @@ int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uin
         if (bytes < 1) return 0;
         memcpy(dst + total, data, static_cast<size_t>(bytes));
         total += bytes;
+        if (!keep) free_segment_buffer(&seg[k]);
     }
+    return total;
+}
+
+}  // namespace
+
+int64_t stitch_segments(TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
+                        int64_t capacity, bool keep) {
+    const int64_t total = copy_segments(seg, count, rate, dst, capacity, keep);
+    for (int32_t k = 0; k < count && !keep; ++k) free_segment_buffer(&seg[k]);
     return total;
 }
 

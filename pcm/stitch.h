@@ -17,8 +17,9 @@ inline int64_t second_bytes(int32_t rate) {
 
 // Copies the count decoded segments to dst (capacity bytes), each from the place where the output
 // already holds the same bytes, or at its end. Returns the bytes written, 0 when a segment has
-// nothing to give.
-int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
-                        int64_t capacity);
+// nothing to give. Unless keep is set, each segment's buffer is freed once it is copied, and all of
+// them in the end.
+int64_t stitch_segments(TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
+                        int64_t capacity, bool keep);
 
 #endif

@@ -323,7 +323,7 @@ int __wrap_fclose(FILE *stream) {
 int32_t __real_mtsrc_seekstream(mtsrc_ctx *source, int64_t position, int64_t *reached);
 int32_t __real_mtsrc_getstream(mtsrc_ctx *source, int32_t want, mtsrc_frame *frame);
 int32_t __real_construct_decbuf(TAVO_CTX *ctx, int64_t start);
-int64_t __real_DecodePcmMT(TAVO_CTX *ctx, void *dst, int64_t dst_capacity);
+void __real_decode_song(TAVO_CTX *ctx);
 int32_t __wrap_mtsrc_seekstream(mtsrc_ctx *source, int64_t position, int64_t *reached) {
     if (landing != kShown) landing = landing == kSeekIsNext ? kHidden : kShown;
     return __real_mtsrc_seekstream(source, position, reached);
@@ -340,8 +340,8 @@ int32_t __wrap_construct_decbuf(TAVO_CTX *ctx, int64_t start) {
     ++plans;
     return __real_construct_decbuf(ctx, start);
 }
-int64_t __wrap_DecodePcmMT(TAVO_CTX *ctx, void *dst, int64_t dst_capacity) {
+void __wrap_decode_song(TAVO_CTX *ctx) {
     while (holding && refused == 0) sched_yield();
-    return __real_DecodePcmMT(ctx, dst, dst_capacity);
+    __real_decode_song(ctx);
 }
 }

@@ -24,9 +24,13 @@ const char *__asan_default_options() {
 
 void *__real_malloc(size_t size);
 void *__real_calloc(size_t count, size_t size);
+void *__real_realloc(void *block, size_t size);
 
 void *__wrap_malloc(size_t size) {
     return allocation_fails() ? nullptr : __real_malloc(size);
+}
+void *__wrap_realloc(void *block, size_t size) {
+    return allocation_fails() ? nullptr : __real_realloc(block, size);
 }
 void *__wrap_calloc(size_t count, size_t size) {
     return allocation_fails() ? nullptr : __real_calloc(count, size);
