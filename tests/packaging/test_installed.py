@@ -73,6 +73,18 @@ class Installed(unittest.TestCase):
         return run(program, *arguments, **options,
                    env={**os.environ, "LD_LIBRARY_PATH": str(self.lib)})
 
+    def test_documents_link_to_what_is_installed(self):
+        documents = sorted((self.prefix / "share/doc/tavo").rglob("*.md"))
+        self.assertGreater(len(documents), 5)
+        links = 0
+        for document in documents:
+            for target in re.findall(r"\]\(([^)#\s]+)[^)]*\)", document.read_text("utf-8")):
+                if "://" in target:
+                    continue
+                links += 1
+                self.assertTrue((document.parent / target).exists(), f"{document.name}: {target}")
+        self.assertGreater(links, 5)
+
     def test_example(self):
         build = self.folder / "build"
         run(CMAKE, "-S", self.examples, "-B", build, "-G", GENERATOR, f"-DCMAKE_C_COMPILER={CC}",
