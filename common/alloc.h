@@ -1,5 +1,7 @@
-// Checked sizes and zeroed memory. Sizes are 64-bit: the durations and rates that they are made of
-// come from files.
+// Checked sizes and zeroed memory, for every folder of the library.
+//
+// Sizes are 64-bit and checked for overflow because they are computed from durations and rates that
+// files state.
 #ifndef TAVO_COMMON_ALLOC_H
 #define TAVO_COMMON_ALLOC_H
 
@@ -9,8 +11,8 @@
 
 constexpr int64_t kBytesPerSample = 2;  // 16-bit mono
 
-// *result = value * factor / divisor, all of them 0 or more, divisor at least 1. False when one is
-// not, or when the product overflows.
+// *result = value * factor / divisor. False if value or factor is negative, divisor is below 1, or
+// the product overflows.
 inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *result) {
     int64_t product = 0;
     if (value < 0 || factor < 0 || divisor < 1) return false;
@@ -19,19 +21,18 @@ inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *
     return true;
 }
 
-// Bytes of a span of PCM: units (100 ns) * rate (Hz) * 2 / 10,000,000, the division last. May be
-// odd.
+// Bytes of a span of PCM: units (100 ns) * rate (Hz) * 2 / 10,000,000, divided last. May be odd.
 inline bool span_bytes(int64_t units, int32_t rate, int64_t *bytes) {
     return scale_size(units, rate * kBytesPerSample, kUnitsPerSecond, bytes);
 }
 
-// Bytes of count elements of size bytes each, and extra bytes behind them.
+// Bytes of count elements of size bytes each, followed by extra bytes.
 inline bool array_bytes(int64_t count, int64_t size, int64_t extra, int64_t *bytes) {
     return scale_size(count, size, 1, bytes) && !__builtin_add_overflow(*bytes, extra, bytes);
 }
 
-// Zeroed room for count items, at least one. Null when memory runs out or the size exceeds size_t.
-// Released with free.
+// Zeroed memory for count items, at least one; the caller's to free. Null if memory runs out or the
+// size exceeds size_t.
 template <typename T>
 T *zeroed_items(int64_t count) {
     const uint64_t items = count > 0 ? static_cast<uint64_t>(count) : 1;

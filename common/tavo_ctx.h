@@ -1,7 +1,8 @@
-// The records that several folders share. Everything in an instance hangs from TAVO_CTX, which owns
-// what its pointers lead to, except the callback.
+// The records that several folders share: the instance, TAVO_CTX, and what hangs from it.
 //
-// Times of the decoding layer are in 100-ns units (10,000,000 a second), results in milliseconds.
+// The instance owns everything that its pointers lead to, except the callback. The decoding counts
+// time in 100-ns units (10,000,000 per second), results are in milliseconds. Made and released by
+// core/instance.h.
 #ifndef TAVO_COMMON_TAVO_CTX_H
 #define TAVO_COMMON_TAVO_CTX_H
 
@@ -14,7 +15,7 @@
 
 struct TAVO_DECSEG;  // pcm/decode.h
 
-// States of an instance; 3 and 4 are final.
+// States of an instance. 3 and 4 are final.
 constexpr int32_t kStateReady = 1;
 constexpr int32_t kStateRunning = 2;
 constexpr int32_t kStateFinished = 3;
@@ -27,7 +28,7 @@ constexpr int32_t kAnalysisRate = 11025;  // Hz, modes 1 and 2
 constexpr int32_t kFrameSize = 512;       // samples at the analysis rate
 constexpr int32_t kHopSize = 256;         // samples at the analysis rate
 
-// The stream as the media source reports it.
+// The stream's format, as the media source reports it.
 struct TAVO_FMT {
     int32_t sample_rate;  // Hz
     int32_t channels;     // of the decoder's output; the PCM delivered always has one
@@ -44,10 +45,10 @@ struct TAVO_HL_CTX {
 
 // Modes 1 and 2.
 struct TAVO_ONSET_CTX {
-    int32_t max_beats;    // most threshold-selected beats, 0 or less for no limit
+    int32_t max_beats;    // maximum number of threshold-selected beats, 0 or less for no limit
     int32_t beat_param2;  // stored, never read
     int32_t beat_count;   // entries of beat_times
-    float *beat_times;    // [beat_count] milliseconds, ascending, owned; TAVO_INFO points here too
+    float *beat_times;    // [beat_count] ms, ascending, owned; TAVO_INFO.beat_times points here
     int32_t bpm;          // tempo estimate, 30 to 200
     int32_t frame_size;   // samples
     int32_t hop_size;     // samples
@@ -55,7 +56,7 @@ struct TAVO_ONSET_CTX {
 
 struct TAVO_CTX {
     char magic[4];          // "ZEKA", written last at creation
-    int32_t quit;           // 1 once a stop is asked for; atomic access only
+    int32_t quit;           // 1 once a stop was requested; atomic access only
     int16_t *pcm;           // source-rate PCM, mono; null once converted
     int64_t pcm_bytes;      // bytes: capacity before decoding, then bytes decoded
     double *ana;            // analysis signal on the 16-bit scale, mono
@@ -67,7 +68,7 @@ struct TAVO_CTX {
     TAVO_ONSET_CTX *onset;  // modes 1 and 2
     TAVO_HL_CTX *hl;        // modes 0 and 2
     TAVO_CALLBACK callback;
-    pthread_t worker;   // the job's thread, valid from state 2 on
+    pthread_t worker;   // the job's thread; zero before tavo_analyze
     int32_t state;      // kState*; atomic access only
     int32_t mode;       // TAVO_MODE_*
     TAVO_INFO *info;    // the result record
@@ -81,7 +82,7 @@ static_assert(offsetof(TAVO_CTX, fmt) == 56 && offsetof(TAVO_CTX, duration) == 7
 static_assert(offsetof(TAVO_CTX, worker) == 104 && offsetof(TAVO_CTX, seg_count) == 128);
 static_assert(offsetof(TAVO_INFO, beat_times) == 8 && offsetof(TAVO_INFO, status) == 16);
 
-// A flag that one thread writes while another reads it without the lock (state, quit).
+// Access to a flag (state, quit) that one thread writes while another reads it without the lock.
 inline int32_t load_flag(const int32_t *flag) {
     return __atomic_load_n(flag, __ATOMIC_ACQUIRE);
 }

@@ -1,6 +1,6 @@
 #include "common/worker_group.h"
 
-#include <cstdlib>
+#include "common/alloc.h"
 
 namespace {
 
@@ -35,7 +35,7 @@ void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *
     bool started[kMaxWorkers] = {};
     if (count > kMaxWorkers) count = kMaxWorkers;
 
-    // All flags before the first thread: a quick worker must not see a neighbour's stale flag.
+    // Before the first thread starts: a quick worker must not see a stale flag of another.
     for (int32_t i = 0; i < count; ++i) done[i] = 0;
     for (int32_t i = 0; i < count; ++i) {
         const worker_slot &slot = slots[i];
@@ -57,17 +57,17 @@ void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *
 }
 
 int32_t worker_lock_create(pthread_mutex_t **mutex, pthread_cond_t **cond) {
-    *mutex = static_cast<pthread_mutex_t *>(calloc(1, sizeof(pthread_mutex_t)));
-    *cond = static_cast<pthread_cond_t *>(calloc(1, sizeof(pthread_cond_t)));
+    *mutex = zeroed_items<pthread_mutex_t>(1);
+    *cond = zeroed_items<pthread_cond_t>(1);
     if (*mutex != nullptr && *cond != nullptr && pthread_mutex_init(*mutex, nullptr) == 0) {
-        if (pthread_cond_init(*cond, nullptr) == 0) return 0;
+        if (pthread_cond_init(*cond, nullptr) == 0) return TAVO_OK;
         pthread_mutex_destroy(*mutex);
     }
     free(*mutex);
     free(*cond);
     *mutex = nullptr;
     *cond = nullptr;
-    return -2;
+    return TAVO_ERR_MEMORY;
 }
 
 void worker_lock_release(pthread_mutex_t **mutex, pthread_cond_t **cond) {

@@ -7,19 +7,23 @@
 
 namespace {
 
+// TAVO_INFO.status
+constexpr int32_t kStatusResult = 0;
+constexpr int32_t kStatusFailure = -1;
+
 void deliver(TAVO_CTX *ctx) {
     if (ctx->callback != nullptr) ctx->callback(ctx->info);
 }
 
-// Beat times count from the start of the analysed signal: make them count from the start of the
+// Beat times count from the start of the analysed signal; hosts want them from the start of the
 // file.
 void shift_beats(TAVO_ONSET_CTX *onset, int32_t start_ms) {
     const auto shift = static_cast<float>(start_ms);
     for (int32_t i = 0; i < onset->beat_count; ++i) onset->beat_times[i] += shift;
 }
 
-// Runs the beat analysis if the analysis signal is there, and reports. No beats is a failure,
-// whatever the reason; a highlight found before is reported all the same.
+// Runs the beat analysis, unless the conversion to the analysis rate failed, and reports. No beats
+// is a failure, whatever the reason; a highlight that was found before is reported in any case.
 void find_and_report_beats(TAVO_CTX *ctx, bool from_highlight, bool converted) {
     TAVO_INFO *info = ctx->info;
     TAVO_ONSET_CTX *onset = converted ? ctx->onset : nullptr;
@@ -29,12 +33,12 @@ void find_and_report_beats(TAVO_CTX *ctx, bool from_highlight, bool converted) {
         if (from_highlight && info->hl_pos != 0) shift_beats(onset, info->hl_pos);
         info->beat_count = onset->beat_count;
         info->beat_times = onset->beat_times;
-        info->status = 0;
+        info->status = kStatusResult;
     } else {
         store_flag(&ctx->state, kStateFailed);
         info->beat_count = 0;
         info->beat_times = nullptr;
-        info->status = -1;
+        info->status = kStatusFailure;
     }
     deliver(ctx);
 }
@@ -47,7 +51,7 @@ extern "C" void *analyzeHighlightOnly(void *arg) {
     getHLPosition(ctx);
     store_flag(&ctx->state, kStateFinished);
     ctx->info->hl_pos = static_cast<int32_t>(ctx->hl->hl_pos);
-    ctx->info->status = 0;
+    ctx->info->status = kStatusResult;
     deliver(ctx);
     pthread_exit(nullptr);
 }
@@ -75,5 +79,5 @@ extern "C" void *analyzeOnsetFromeHi(void *arg) {
 
 extern "C" int32_t analyzeOnsetenv(TAVO_CTX *ctx) {
     find_and_report_beats(ctx, ctx->mode == TAVO_MODE_BOTH && ctx->hl != nullptr, true);
-    return 0;
+    return TAVO_OK;
 }

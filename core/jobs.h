@@ -1,7 +1,8 @@
-// The bodies of the worker thread that tavo_analyze starts, one per mode.
+// Stages 2 to 8 in order: the job of each mode, the body of the thread that tavo_analyze starts.
 //
-// Each decodes the file, runs its analyses, fills the instance's TAVO_INFO, sets the final state
-// and calls the callback exactly once.
+// In: TAVO_CTX, created and with its arguments stored. Out: TAVO_INFO, passed to the callback
+// exactly once, after the final state is set. A job decodes the file and runs the analyses of its
+// mode. Before: core/lifecycle.h. After: the host's callback, jni/tavo_jni.h.
 #ifndef TAVO_CORE_JOBS_H
 #define TAVO_CORE_JOBS_H
 
@@ -9,14 +10,15 @@
 
 extern "C" {
 
-// Thread entries: the argument is the TAVO_CTX; none returns, each ends its thread by pthread_exit.
+// Thread entries. The argument is the TAVO_CTX. They end their thread by pthread_exit.
 void *analyzeHighlightOnly(void *ctx);  // mode 0
 void *analyzeOnsetOnly(void *ctx);      // mode 1
 void *analyzeOnsetFromeHi(void *ctx);   // mode 2
-void *analyzeHighlight(void *ctx);      // the same as analyzeHighlightOnly, for direct use
+void *analyzeHighlight(void *ctx);      // as analyzeHighlightOnly, for direct use
 
-// The beat analysis and its report alone, on an instance whose ana is filled; returns 0 to its
-// caller after the callback. In mode 2 the beats are shifted by the highlight start.
+// Only the beat analysis and its report, on an instance whose ana is filled. In mode 2 the beats
+// are shifted by the highlight start. Returns TAVO_OK to its caller, after the callback. An
+// instance without an onset context reports a failure.
 int32_t analyzeOnsetenv(TAVO_CTX *ctx);
 }
 

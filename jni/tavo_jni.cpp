@@ -16,15 +16,17 @@ constexpr char kHostClass[] = "com/kestu/tavo/Tavo";
 constexpr char kPostEvent[] = "postEventFromNative";
 constexpr char kPostEventSignature[] = "(Ljava/lang/Object;III[F)V";
 
+constexpr jint kFailed = -1;  // of analyze and deinit
+
 constexpr jint kEventResult = 1;
 constexpr jint kEventFailure = 2;
 
-// What native_setup stored. Counted, because a later native_setup may replace it while a worker
-// thread is in the middle of posting an event with it.
+// The references that native_setup stored. Counted, because a later native_setup may replace them
+// while a worker thread is posting an event with them.
 struct host_refs {
     jclass host_class;  // global reference
     jobject object;     // global reference; null when the host gave null
-    int32_t users;      // the bridge itself and each event under way; under host_mutex
+    int32_t users;      // the bridge itself and each event being posted; under host_mutex
 };
 
 pthread_mutex_t host_mutex = PTHREAD_MUTEX_INITIALIZER;
@@ -40,8 +42,8 @@ TAVO_CTX *instance = nullptr;
 
 TAVO_PARAM init_param = {};  // under tavo_jni_mutex; path is null outside tavo_init
 
-// The thread that is posting an event, or none: a deinit from there must not wait for the lock that
-// a deinit elsewhere holds while it waits for this very thread. Atomic access only.
+// The thread that is posting an event, or zero. A deinit on that thread must not wait for the lock,
+// which a deinit on another thread may hold while it joins this one. Atomic access only.
 pthread_t posting_thread = {};
 
 template <typename T>
@@ -69,8 +71,7 @@ long handle_value(const TAVO_CTX *ctx) {
 
 // ---- the lock of init and deinit ----
 
-// Creates the lock on first use: of two threads that come first together, both get the same one. A
-// lock that is there already is used.
+// Creates the lock if there is none. Two threads that are first together get the same one.
 pthread_mutex_t *lock_for_init() {
     pthread_mutex_t *mutex = nullptr;
     const bool created = __atomic_compare_exchange_n(&tavo_jni_mutex, &mutex, &lifecycle_mutex,
@@ -80,7 +81,7 @@ pthread_mutex_t *lock_for_init() {
     return mutex;
 }
 
-// Null, and nothing locked, when no init has ever run.
+// Null, with nothing locked, before the first init.
 pthread_mutex_t *lock_for_deinit() {
     pthread_mutex_t *mutex = load_pointer(&tavo_jni_mutex);
     if (mutex != nullptr) pthread_mutex_lock(mutex);
@@ -116,13 +117,13 @@ void drop_host(JNIEnv *env, host_refs *host) {
     if (last) delete_host(env, host);
 }
 
-// Null when memory or a global reference cannot be had.
+// Null if memory runs out.
 host_refs *make_host(JNIEnv *env, jclass host_class, jobject obj) {
     auto *host = static_cast<host_refs *>(calloc(1, sizeof(host_refs)));
     if (host == nullptr) return nullptr;
     host->users = 1;
     host->host_class = static_cast<jclass>(env->NewGlobalRef(host_class));
-    // Nothing more may be asked for once one request has failed.
+    // After a failed call an exception is pending, and NewGlobalRef is not allowed.
     if (host->host_class != nullptr && obj != nullptr) host->object = env->NewGlobalRef(obj);
     if (host->host_class == nullptr || (obj != nullptr && host->object == nullptr)) {
         delete_host(env, host);
@@ -133,15 +134,15 @@ host_refs *make_host(JNIEnv *env, jclass host_class, jobject obj) {
 
 // ---- init ----
 
-// Finds the callback in the class and keeps it. Null when there is none; an exception is then
-// pending.
+// Looks up the event method in the class and stores it. Null, with an exception pending, if it is
+// missing.
 jmethodID find_post_event(JNIEnv *env, jclass host_class) {
     jmethodID method = env->GetStaticMethodID(host_class, kPostEvent, kPostEventSignature);
     if (method != nullptr) store_pointer(&post_event, method);
     return method;
 }
 
-// False when the class or its callback is missing; the exception that says so is cleared.
+// False, with the exception cleared, if the class or its event method is missing.
 bool look_up_host(JNIEnv *env) {
     jclass host_class = env->FindClass(kHostClass);
     const bool found = host_class != nullptr && find_post_event(env, host_class) != nullptr;
@@ -150,7 +151,7 @@ bool look_up_host(JNIEnv *env) {
     return found;
 }
 
-// Under the lock. The characters are the caller's and may be given back once this returns.
+// Under the lock. The characters are read only during the call.
 TAVO_CTX *create_instance(const char *path, jint mode, int32_t *err) {
     init_param.path = path;
     init_param.mode = mode;
@@ -159,7 +160,7 @@ TAVO_CTX *create_instance(const char *path, jint mode, int32_t *err) {
     return ctx;
 }
 
-// Under the lock. The handle is published last: whoever sees it may start it.
+// Under the lock. Stores the handle last: analyze, which takes no lock, may use it at once.
 jint adopt_instance(JNIEnv *env, TAVO_CTX *ctx) {
     if (!look_up_host(env)) {
         tavo_deinit(ctx);
@@ -202,7 +203,7 @@ jint init_locked(JNIEnv *env, jstring path, jint mode) {
 jint deinit_failed(const TAVO_CTX *ctx, jint code) {
     __android_log_print(ANDROID_LOG_ERROR, kTag, "tavo_deinit(%ld) is failed. error=%d",
                         handle_value(ctx), code);
-    return -1;
+    return kFailed;
 }
 
 jint deinit_locked() {
@@ -221,7 +222,7 @@ jint deinit_locked() {
 
 // ---- events ----
 
-// The environment's type in AttachCurrentThread differs between the JDK's header and the NDK's.
+// The type of the environment in AttachCurrentThread differs between the headers of JDK and NDK.
 template <typename Vm, typename Env>
 jint attach_thread(Vm *vm, jint (Vm::*attach)(Env **, void *), JNIEnv **env) {
     Env *attached = nullptr;
@@ -230,7 +231,7 @@ jint attach_thread(Vm *vm, jint (Vm::*attach)(Env **, void *), JNIEnv **env) {
     return result;
 }
 
-// This thread's environment, attaching the thread when it has none; null when that fails.
+// The environment of this thread, which is attached if necessary. Null if that fails.
 JNIEnv *environment(JavaVM *vm, bool *attached_here) {
     void *known = nullptr;
     if (vm->GetEnv(&known, JNI_VERSION_1_6) == JNI_OK) return static_cast<JNIEnv *>(known);
@@ -244,7 +245,7 @@ void notification_failed(JNIEnv *env) {
     env->ExceptionClear();
 }
 
-// A local reference, or null with nothing pending when the virtual machine has no room.
+// A local reference; null, with the exception cleared, if the virtual machine is out of memory.
 jfloatArray copy_beats(JNIEnv *env, const TAVO_INFO *info) {
     jfloatArray beats = env->NewFloatArray(info->beat_count);
     if (beats == nullptr) {
@@ -264,8 +265,7 @@ void post(JNIEnv *env, const host_refs *host, jmethodID method, const TAVO_INFO 
 
     env->CallStaticVoidMethod(host->host_class, method, host->object, what, info->hl_pos, count,
                               beats);
-    // The thread may have been attached before and live on: its local references are not ours to
-    // leave behind.
+    // The thread may have been attached before and live on: leave it no local reference.
     if (beats != nullptr) env->DeleteLocalRef(beats);
     if (env->ExceptionCheck() == JNI_TRUE) notification_failed(env);
 }
@@ -277,7 +277,7 @@ extern "C" {
 JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *vm, void *) {
     store_pointer(&java_vm, vm);
     void *env = nullptr;
-    return vm->GetEnv(&env, JNI_VERSION_1_6) == JNI_OK ? JNI_VERSION_1_6 : -1;
+    return vm->GetEnv(&env, JNI_VERSION_1_6) == JNI_OK ? JNI_VERSION_1_6 : JNI_ERR;
 }
 
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobject thiz,
@@ -299,7 +299,7 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobje
 
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject, jstring path,
                                                      jint mode) {
-    // Inside an event there is an instance, and whoever is ending it holds the lock.
+    // Inside an event: a deinit that waits for this thread may hold the lock.
     if (is_posting() && load_pointer(&instance) != nullptr) return already_opened();
     pthread_mutex_t *mutex = lock_for_init();
     const jint result = init_locked(env, path, mode);
@@ -314,11 +314,11 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *, jobject, jint 
     const int32_t result = tavo_analyze(ctx, hl_param, max_beats, beat_param2);
     if (result < 0) {
         __android_log_print(ANDROID_LOG_ERROR, kTag, "tavo_analyze() is failed. error=%d", result);
-        return -1;
+        return kFailed;
     }
     __android_log_print(ANDROID_LOG_VERBOSE, kTag, "tavo_analyze (id:%ld) - start",
                         handle_value(ctx));
-    return result == 0 ? 0 : -1;
+    return result == TAVO_OK ? 0 : kFailed;
 }
 
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *, jobject) {
@@ -350,11 +350,11 @@ void tavocallback(TAVO_INFO *info) {
         mark_posting(pthread_self());
         post(env, host, method, info);
         mark_posting({});
-    } else {  // no host class, or none with the callback: nobody to tell but the log
+    } else {  // no class stored, or one without the method
         notification_failed(env);
     }
     drop_host(env, host);
-    // The runtime counts an attached thread as running: one that ends so aborts or holds it up.
+    // A thread that ends attached aborts Android's runtime and keeps a desktop one from exiting.
     if (attached_here) vm->DetachCurrentThread();
 }
 }

@@ -9,34 +9,33 @@ import java.lang.ref.WeakReference;
  * Tavo.disableClickTrack();
  * Tavo tavo = new Tavo(listener);
  * if (tavo.init(path, Tavo.MODE_BOTH) == 0) tavo.analyze(30, 0, 0);
- * // the listener is called once, on another thread; then, or to stop early:
+ * // The listener is called once, on another thread. Then, or to stop early:
  * tavo.deinit();
  * }</pre>
  *
- * <p><b>One analysis in a process.</b> All objects of this class drive the same one native
- * analysis, and events go to the object that was made last: make one and keep it.
+ * <p><b>One analysis in a process.</b> All objects of this class share one native analysis, and the
+ * object that was created last gets the events: create one and keep it.
  *
- * <p><b>Order.</b> {@code init}, {@code analyze} once, the event once, {@code deinit}; a new
- * analysis starts over with {@code init}. {@code deinit} may come at any time after {@code init}
- * and ends a running job, whose event still comes before it returns.
+ * <p><b>Order.</b> {@code init}, {@code analyze} once, the event once, {@code deinit}; then
+ * {@code init} again for the next file. {@code deinit} is allowed at any time after {@code init}. It
+ * stops a running job, whose event still comes before {@code deinit} returns.
  *
- * <p><b>Threads.</b> {@code init}, {@code analyze} and {@code deinit} are called from one thread,
- * or one after another. {@code init} reads the head of the file and {@code deinit} waits for a
- * running job: neither belongs on a thread that draws. Events come on a thread of the library's.
+ * <p><b>Threads.</b> Call {@code init}, {@code analyze} and {@code deinit} from one thread, or from
+ * several that take turns. {@code init} reads from the file and {@code deinit} waits for a running
+ * job, so do not call them on a user-interface thread. Events come on a thread of the library.
  *
- * <p><b>Lifetime.</b> The library holds this object weakly: keep a reference for as long as the
- * event is wanted, since that of a collected object is dropped. The native analysis itself is
- * released by {@code deinit} alone; what a forgotten object has left open, the next object's
- * {@code deinit} releases.
+ * <p><b>Lifetime.</b> The library holds this object by a weak reference: keep a reference of your own
+ * until the event has come, or it is dropped. Only {@code deinit} releases the native analysis; if
+ * an object is lost before its {@code deinit}, that of the next object releases it.
  *
  * <p><b>Click track.</b> The modes with beats write a diagnostic WAV file into the working directory
  * unless {@link #disableClickTrack} was called. On Android the working directory is not writable and
  * no file appears.
  *
- * <p><b>Paths.</b> Characters outside the basic multilingual plane (emoji, for one) reach the
- * library in Java's own form and name no file: open such a file and pass
- * {@code "/proc/self/fd/" + number} instead, which is also the way for a file descriptor without a
- * name. The descriptor is needed until {@code init} has returned.
+ * <p><b>Paths.</b> A path with characters outside the basic multilingual plane, such as emoji, is not
+ * found, because Java passes them in an encoding of its own. Open such a file and pass
+ * {@code "/proc/self/fd/" + number}, which also works for a descriptor without a name. Keep the
+ * descriptor open until {@code init} has returned.
  */
 public final class Tavo implements AutoCloseable {
     /** Finds the start of the highlight. */
@@ -48,13 +47,13 @@ public final class Tavo implements AutoCloseable {
     /** Finds the highlight, then the beats from there on. */
     public static final int MODE_BOTH = 2;
 
-    /** {@code init}: an analysis is open already, of this or of another object. */
+    /** {@code init}: this or another object has an open analysis. */
     public static final int ERROR_BUSY = -1;
 
     /** {@code init}: out of memory. */
     public static final int ERROR_MEMORY = -2;
 
-    /** {@code init}: the path is null or names no file that can be analysed. */
+    /** {@code init}: the path is null, or the file cannot be analysed. */
     public static final int ERROR_UNUSABLE = -4;
 
     private static final int EVENT_RESULT = 1;
@@ -66,9 +65,9 @@ public final class Tavo implements AutoCloseable {
     private final TavoListener listener;
 
     /**
-     * Makes this object the one that receives the events of the process.
+     * Creates the object that receives the events from now on.
      *
-     * @param listener told of each analysis's result, not null
+     * @param listener receives the result of each analysis, not null
      */
     public Tavo(TavoListener listener) {
         if (listener == null) throw new NullPointerException("listener");
@@ -83,16 +82,16 @@ public final class Tavo implements AutoCloseable {
      */
     public static native void disableClickTrack();
 
-    /** Tells the library whom its events are for: the object's own weak reference. */
+    /** Registers the first argument of the events: a weak reference to this object. */
     private native void native_setup(Object obj);
 
     /**
-     * Opens a file and plans its analysis.
+     * Opens a file and prepares its analysis.
      *
      * @param path the file, fewer than 512 bytes in UTF-8
      * @param mode one of the modes above
-     * @return 0, {@link #ERROR_BUSY}, {@link #ERROR_MEMORY} or {@link #ERROR_UNUSABLE}; nothing has
-     *     changed after an error
+     * @return 0, {@link #ERROR_BUSY}, {@link #ERROR_MEMORY} or {@link #ERROR_UNUSABLE}; nothing
+     *     changes on an error
      */
     public native int init(String path, int mode);
 
@@ -100,17 +99,17 @@ public final class Tavo implements AutoCloseable {
      * Starts the analysis on a thread of its own.
      *
      * @param highlightSeconds highlight length wanted, 0 for none; not used in {@link #MODE_BEATS}
-     * @param maxBeats most beats to choose, 0 for no limit; not used in {@link #MODE_HIGHLIGHT}
+     * @param maxBeats maximum number of threshold-selected beats, 0 for no limit; not used in {@link #MODE_HIGHLIGHT}
      * @param reserved not used, 0
-     * @return 0 when started, -1 when not (it was started before); 0 also without {@code init}, when
-     *     nothing happens and no event comes
+     * @return 0 if started, -1 if not (it was started before); also 0 without {@code init}, in which
+     *     case nothing happens and no event comes
      */
     public native int analyze(int highlightSeconds, int maxBeats, int reserved);
 
     /**
-     * Ends the analysis: waits until a running job has delivered its event, then releases it.
+     * Ends the analysis: stops a running job, waits for its event and releases everything.
      *
-     * @return 0, also when nothing was open; -1 when called by a listener
+     * @return 0, also if nothing was open; -1 if called by a listener
      */
     public native int deinit();
 
@@ -121,9 +120,10 @@ public final class Tavo implements AutoCloseable {
     }
 
     /**
-     * Called by the library, by this name and signature, once per analysis on its worker thread.
+     * Called by the library once per analysis, on its worker thread. The library looks it up by name
+     * and signature.
      *
-     * @param ref what {@code native_setup} was given
+     * @param ref the argument of {@code native_setup}
      * @param what 1 a result, 2 a failure
      * @param arg1 start of the highlight, milliseconds
      * @param arg2 number of beats

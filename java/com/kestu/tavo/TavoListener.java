@@ -1,32 +1,31 @@
 package com.kestu.tavo;
 
 /**
- * Receives the one event of an analysis.
+ * Receives the result of an analysis: exactly one call of one of these methods.
  *
- * <p>Both methods run on the library's worker thread, never on the thread that called
- * {@link Tavo#analyze}; an application that touches its user interface hands the values to its own
- * thread first. A listener returns soon and must not call {@link Tavo#deinit}, which answers -1
- * there: the job is not over before the listener has returned. What a listener throws is written to
- * the log and dropped.
+ * <p>Both methods run on a thread of the library, never on the thread that called
+ * {@link Tavo#analyze}; pass the values to your own thread before you touch a user interface. Return
+ * soon, and do not call {@link Tavo#deinit}, which returns -1 there. The log says when a method
+ * threw an exception, which is then dropped.
  */
 public interface TavoListener {
     /**
-     * The analysis has found what its mode looks for.
+     * The analysis succeeded.
      *
      * @param tavo the object whose {@code analyze} was called
      * @param highlightMs start of the highlight, milliseconds from the start of the file; 0 in
      *     {@link Tavo#MODE_BEATS}
      * @param beatsMs beat times, milliseconds from the start of the file, ascending; empty in
-     *     {@link Tavo#MODE_HIGHLIGHT}. The array is the listener's to keep.
+     *     {@link Tavo#MODE_HIGHLIGHT}. The listener may keep the array.
      */
     void onResult(Tavo tavo, int highlightMs, float[] beatsMs);
 
     /**
-     * No beats were found, the analysis was stopped, or memory ran out.
+     * The analysis failed: it found no beats, was stopped, or ran out of memory.
      *
      * @param tavo the object whose {@code analyze} was called
-     * @param highlightMs start of the highlight in milliseconds when {@link Tavo#MODE_BOTH} had
-     *     found it before it failed, else 0
+     * @param highlightMs start of the highlight in milliseconds if {@link Tavo#MODE_BOTH} had found
+     *     it before the failure, else 0
      */
     void onFailure(Tavo tavo, int highlightMs);
 }
