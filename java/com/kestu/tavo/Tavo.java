@@ -17,25 +17,25 @@ import java.lang.ref.WeakReference;
  * object that was created last gets the events: create one and keep it.
  *
  * <p><b>Order.</b> {@code init}, {@code analyze} once, the event once, {@code deinit}; then
- * {@code init} again for the next file. {@code deinit} is allowed at any time after {@code init}. It
- * stops a running job, whose event still comes before {@code deinit} returns.
+ * {@code init} again for the next file. {@code deinit} is allowed at any time after {@code init}.
+ * It stops a running job, whose event still comes before {@code deinit} returns.
  *
  * <p><b>Threads.</b> Call {@code init}, {@code analyze} and {@code deinit} from one thread, or from
  * several that take turns. {@code init} reads from the file and {@code deinit} waits for a running
  * job, so do not call them on a user-interface thread. Events come on a thread of the library.
  *
- * <p><b>Lifetime.</b> The library holds this object by a weak reference: keep a reference of your own
- * until the event has come, or it is dropped. Only {@code deinit} releases the native analysis; if
- * an object is lost before its {@code deinit}, that of the next object releases it.
+ * <p><b>Lifetime.</b> The library holds this object by a weak reference: keep a reference of your
+ * own until the event has come, or it is dropped. Only {@code deinit} releases the native analysis;
+ * if an object is lost before its {@code deinit}, that of the next object releases it.
  *
- * <p><b>Click track.</b> The modes with beats write a diagnostic WAV file into the working directory
- * unless {@link #disableClickTrack} was called. On Android the working directory is not writable and
- * no file appears.
+ * <p><b>Click track.</b> The modes with beats write a diagnostic WAV file into the working
+ * directory unless {@link #disableClickTrack} was called. On Android the working directory is not
+ * writable and no file appears.
  *
- * <p><b>Paths.</b> A path with characters outside the basic multilingual plane, such as emoji, is not
- * found, because Java passes them in an encoding of its own. Open such a file and pass
- * {@code "/proc/self/fd/" + number}, which also works for a descriptor without a name. Keep the
- * descriptor open until {@code init} has returned.
+ * <p><b>Paths.</b> A path with characters outside the basic multilingual plane, such as emoji, is
+ * not found, because Java passes them in an encoding of its own. Open such a file and pass {@code
+ * "/proc/self/fd/" + number}, which also works for a descriptor without a name. Keep the descriptor
+ * open until {@code init} has returned.
  */
 public final class Tavo implements AutoCloseable {
     /** Finds the start of the highlight. */
@@ -76,9 +76,9 @@ public final class Tavo implements AutoCloseable {
     }
 
     /**
-     * Stops the library from writing its diagnostic click track, a WAV file in the working directory
-     * that every analysis with beats overwrites. It holds for the whole process and cannot be undone.
-     * Call it before {@link #analyze}.
+     * Stops the library from writing its diagnostic click track, a WAV file in the working
+     * directory that every analysis with beats overwrites. It holds for the whole process and
+     * cannot be undone. Call it before {@link #analyze}.
      */
     public static native void disableClickTrack();
 
@@ -99,10 +99,11 @@ public final class Tavo implements AutoCloseable {
      * Starts the analysis on a thread of its own.
      *
      * @param highlightSeconds highlight length wanted, 0 for none; not used in {@link #MODE_BEATS}
-     * @param maxBeats maximum number of threshold-selected beats, 0 for no limit; not used in {@link #MODE_HIGHLIGHT}
+     * @param maxBeats maximum number of threshold-selected beats, 0 for no limit; not used in
+     *     {@link #MODE_HIGHLIGHT}
      * @param reserved not used, 0
-     * @return 0 if started, -1 if not (it was started before); also 0 without {@code init}, in which
-     *     case nothing happens and no event comes
+     * @return 0 if started, -1 if not (it was started before); also 0 without {@code init}, in
+     *     which case nothing happens and no event comes
      */
     public native int analyze(int highlightSeconds, int maxBeats, int reserved);
 
@@ -120,8 +121,8 @@ public final class Tavo implements AutoCloseable {
     }
 
     /**
-     * Called by the library once per analysis, on its worker thread. The library looks it up by name
-     * and signature.
+     * Called by the library once per analysis, on its worker thread. The library looks it up by
+     * name and signature.
      *
      * @param ref the argument of {@code native_setup}
      * @param what 1 a result, 2 a failure

@@ -4,9 +4,9 @@ package com.kestu.tavo;
  * Receives the result of an analysis: exactly one call of one of these methods.
  *
  * <p>Both methods run on a thread of the library, never on the thread that called
- * {@link Tavo#analyze}; pass the values to your own thread before you touch a user interface. Return
- * soon, and do not call {@link Tavo#deinit}, which returns -1 there. The log says when a method
- * threw an exception, which is then dropped.
+ * {@link Tavo#analyze}; pass the values to your own thread before you touch a user interface.
+ * Return soon, and do not call {@link Tavo#deinit}, which returns -1 there. The log says when a
+ * method threw an exception, which is then dropped.
  */
 public interface TavoListener {
     /**
