@@ -2,7 +2,7 @@
  * and the beats from there on; times are in milliseconds. SECONDS is the length of the highlight
  * wanted, 30 unless given.
  *
- * cc analyze_file.c -o analyze_file $(pkg-config --cflags --libs tavo) -pthread
+ * cc analyze_file.c -o analyze_file $(pkg-config --cflags --libs tavo)
  */
 #include <pthread.h>
 #include <stdio.h>

@@ -65,8 +65,7 @@ class Installed(unittest.TestCase):
 
     def build(self, compiler, source, *options):
         program = self.folder / f"{source.stem}.program"
-        run(compiler, *options, *STRICT, source, *self.pkg_config("--cflags", "--libs"),
-            "-pthread", "-o", program)
+        run(compiler, *options, *STRICT, source, *self.pkg_config("--cflags", "--libs"), "-o", program)
         return program
 
     def run_linked(self, program, *arguments, **options):
@@ -140,6 +139,7 @@ class Installed(unittest.TestCase):
     def test_versions(self):
         self.assertEqual(run(self.tavo, "--version"), f"tavo {VERSION}\n")
         self.assertEqual(self.pkg_config("--modversion"), [VERSION])
+        self.assertIn("-pthread", self.pkg_config("--libs"))
         self.assertIn(f"soname: [{SONAME}]", run("readelf", "-d", self.lib / "libtavo.so"))
         self.assertEqual(os.readlink(self.lib / "libtavo.so"), SONAME)
 
