@@ -11,6 +11,7 @@ install(TARGETS tavo EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}
 # that every program searches, and android-liblog has a liblog of another make.
 if(NOT ANDROID)
   install(TARGETS log wexaaudio EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)
+  install(TARGETS wexaaudio_av DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)  # wexaaudio loads it
 endif()
 
 include(CMakePackageConfigHelpers)

@@ -19,7 +19,7 @@ set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS_PRIVATE_DIRS ${CMAKE_LIBRARY_OUTPUT_DIRECTORY})
 set(CPACK_DEBIAN_PACKAGE_CONTROL_STRICT_PERMISSION ON)
 # What a package that links to libtavo depends on, and the refreshing of the loader's cache. CPack's
-# own way would warn about the two private libraries, which have no versions.
+# own way would warn about the private libraries, which have no versions.
 set(control ${CMAKE_BINARY_DIR}/packaging/control)
 file(WRITE ${control}/shlibs "libtavo ${PROJECT_VERSION_MAJOR} tavo (>= ${PROJECT_VERSION})\n")
 file(WRITE ${control}/triggers "activate-noawait ldconfig\n")

@@ -5,7 +5,7 @@
 set -eu
 cd "$(dirname "$0")/.."
 root=$PWD/build/aarch64-sysroot
-packages='libc6-dev libstdc++-12-dev libavcodec-dev libavformat-dev libogg-dev libgtest-dev
+packages='libc6-dev libstdc++-12-dev libavcodec-dev libavutil-dev libflac-dev libogg-dev libgtest-dev
     libbenchmark-dev nlohmann-json3-dev'
 headers='android-libnativehelper-dev:amd64 android-liblog-dev:amd64' # built for amd64 alone
 [ -e "$root/.complete" ] && [ "$(cat "$root/.complete")" = "$packages $headers" ] && exit 0

@@ -6,7 +6,7 @@ set -euo pipefail
 
 build=(
   g++ cmake ninja-build pkg-config
-  libavcodec-dev libavformat-dev libavutil-dev libogg-dev
+  libavcodec-dev libavutil-dev libflac-dev libogg-dev
   libcli11-dev nlohmann-json3-dev
 )
 java=(default-jdk-headless) # the bridge and the class for Java hosts

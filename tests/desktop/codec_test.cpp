@@ -7,6 +7,7 @@
 #include <cstdlib>
 #include <fstream>
 #include <iterator>
+#include <random>
 
 namespace codec_test {
 
@@ -27,7 +28,10 @@ struct saved_files {
 }  // namespace
 
 std::string fixture(const std::string &name) {
-    return std::string(CODEC_FIXTURES) + "/" + name;
+    const std::string golden = "golden/";
+    const bool kept = name.compare(0, golden.size(), golden) == 0;
+    return std::string(kept ? CODEC_GOLDEN : CODEC_FIXTURES) + "/" +
+           (kept ? name.substr(golden.size()) : name);
 }
 
 bytes load(const std::string &path) {
@@ -56,13 +60,6 @@ bytes joined(const std::vector<bytes> &pieces) {
     bytes file;
     for (const bytes &piece : pieces) file.insert(file.end(), piece.begin(), piece.end());
     return file;
-}
-
-bytes noise(size_t size) {
-    std::mt19937 random(5);
-    bytes out(size);
-    std::generate(out.begin(), out.end(), [&] { return static_cast<uint8_t>(random()); });
-    return out;
 }
 
 opened::opened(const std::string &path) {
@@ -109,28 +106,6 @@ void expect_same(const samples &got, const samples &wanted) {
     EXPECT_EQ(differs - got.begin(), static_cast<ptrdiff_t>(got.size())) << "the first to differ";
 }
 
-void expect_changed(const samples &whole, const std::vector<changed_file> &files) {
-    for (const changed_file &each : files) {
-        SCOPED_TRACE(each.name);
-        const std::string path = save("changed", each.contents);
-        const samples got = read_all(path);
-        ASSERT_EQ(got.size(), each.size);
-        const auto at = [](const samples &all, size_t sample) {
-            return all.begin() + static_cast<ptrdiff_t>(sample);
-        };
-        expect_same({got.begin(), at(got, each.same_until)},
-                    {whole.begin(), at(whole, each.same_until)});
-        if (each.same_from != changed_file::kNever) {
-            const size_t behind = whole.size() - each.same_from;
-            expect_same({at(got, got.size() - behind), got.end()},
-                        {at(whole, each.same_from), whole.end()});
-        }
-        expect_same({at(got, each.silent_from), at(got, each.silent_until)},
-                    samples(each.silent_until - each.silent_from));
-        if (each.exact_seams) expect_exact_seams(path);
-    }
-}
-
 void expect_exact_seams(const std::string &path) {
     SCOPED_TRACE(path);
     const samples linear = read_all(path);
@@ -169,71 +144,6 @@ void expect_exact_seams(const std::string &path) {
             EXPECT_LE(2 * left, duration / 4 * 2 * rate / kUnits);
         }
     }
-}
-
-bytes damaged(bytes file, std::mt19937 &random) {
-    const auto below = [&](size_t limit) { return random() % std::max<size_t>(limit, 1); };
-    const size_t wounds = 1 + below(20);
-    const bool head_only = below(3) == 0;
-    for (size_t i = 0; i < wounds && file.size() > 64; ++i) {
-        const size_t at = below(head_only ? 512 : file.size());
-        const size_t run =
-            std::min(1 + below(i % 2 == 0 ? 8 : 4000), file.size() - std::min(at, file.size()));
-        const auto from = file.begin() + static_cast<ptrdiff_t>(std::min(at, file.size()));
-        const auto to = from + static_cast<ptrdiff_t>(run);
-        switch (below(7)) {
-            case 0:
-                std::for_each(from, to,
-                              [&](uint8_t &b) { b = static_cast<uint8_t>(b ^ 1 << below(8)); });
-                break;
-            case 1:
-                std::generate(from, to, [&] { return static_cast<uint8_t>(random()); });
-                break;
-            case 2:
-                std::fill(from, to, uint8_t{0});
-                break;
-            case 3:
-                std::fill(from, to, uint8_t{0xFF});
-                break;
-            case 4:
-                file.erase(from, to);
-                break;
-            case 5: {
-                const bytes piece(from, to);
-                const auto place = file.begin() + static_cast<ptrdiff_t>(below(file.size()));
-                file.insert(place, piece.begin(), piece.end());
-                break;
-            }
-            default:
-                file.resize(file.size() -
-                            std::min(file.size() - 1, below(i == 0 ? file.size() : 64)));
-        }
-    }
-    return file;
-}
-
-bool reads_consistently(const std::string &path, std::mt19937 &random) {
-    opened file(path);
-    if (file.source == nullptr) {
-        EXPECT_LT(file.error, 0);
-        return false;
-    }
-    const int64_t rate = file.format.sample_rate;
-    const int64_t duration = file.format.duration;
-    EXPECT_GE(duration, 0);
-    const samples linear = read(file.source, SIZE_MAX);
-    EXPECT_EQ(duration * rate / kUnits, static_cast<int64_t>(linear.size()));
-    for (int k = 0; k < 4; ++k) {
-        const int64_t position =
-            static_cast<int64_t>(random() % static_cast<uint64_t>(duration + kUnits));
-        int64_t reached = -1;
-        EXPECT_EQ(mtsrc_seekstream(file.source, position, &reached), 0);
-        EXPECT_GE(reached, 0);
-        EXPECT_LE(reached, std::max(position, duration));
-        const size_t sample = static_cast<size_t>(reached * rate / kUnits);
-        EXPECT_EQ(sample + read(file.source, SIZE_MAX).size(), linear.size());
-    }
-    return true;
 }
 
 mtsrc_io io_for(const std::string &path) {

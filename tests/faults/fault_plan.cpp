@@ -18,7 +18,6 @@
 extern "C" {
 #include <libavcodec/avcodec.h>
 #include <libavcodec/vorbis_parser.h>
-#include <libavformat/avformat.h>
 #include <ogg/ogg.h>
 }
 
@@ -117,7 +116,7 @@ void __wrap_free(void *block) {
     __real_free(block);
 }
 
-// What libavutil, libavcodec and libavformat allocate on our call. Blocks of av_mallocz become a
+// What libavutil and libavcodec allocate on our call. Blocks of av_mallocz become a
 // decoder's, which releases them itself: they are not counted.
 void *__real_av_malloc(size_t size);
 void *__real_av_mallocz(size_t size);
@@ -184,55 +183,6 @@ int __wrap_avcodec_send_packet(AVCodecContext *ctx, const AVPacket *packet) {
 int __wrap_avcodec_receive_frame(AVCodecContext *ctx, AVFrame *frame) {
     if (fails(call::allocation)) return AVERROR(ENOMEM);
     return __real_avcodec_receive_frame(ctx, frame);
-}
-
-AVFormatContext *__real_avformat_alloc_context();
-int __real_avformat_open_input(AVFormatContext **ctx, const char *url, const AVInputFormat *format,
-                               AVDictionary **options);
-void __real_avformat_close_input(AVFormatContext **ctx);
-AVIOContext *__real_avio_alloc_context(unsigned char *buf, int size, int writable, void *opaque,
-                                       int (*read)(void *, uint8_t *, int),
-                                       int (*write)(void *, uint8_t *, int),
-                                       int64_t (*seek)(void *, int64_t, int));
-void __real_avio_context_free(AVIOContext **io);
-int __real_av_dict_set(AVDictionary **dict, const char *key, const char *value, int flags);
-int __real_av_read_frame(AVFormatContext *ctx, AVPacket *packet);
-AVFormatContext *__wrap_avformat_alloc_context() {
-    return fails(call::allocation) ? nullptr : made(__real_avformat_alloc_context());
-}
-// Releases the caller's context when it fails.
-int __wrap_avformat_open_input(AVFormatContext **ctx, const char *url, const AVInputFormat *format,
-                               AVDictionary **options) {
-    const bool refuse = fails(call::allocation);
-    const void *before = *ctx;
-    if (refuse) avformat_free_context(*ctx);
-    if (refuse) *ctx = nullptr;
-    const int result =
-        refuse ? AVERROR(ENOMEM) : __real_avformat_open_input(ctx, url, format, options);
-    if (*ctx == nullptr) given_back(before);
-    return result;
-}
-void __wrap_avformat_close_input(AVFormatContext **ctx) {
-    given_back(*ctx);
-    __real_avformat_close_input(ctx);
-}
-AVIOContext *__wrap_avio_alloc_context(unsigned char *buf, int size, int writable, void *opaque,
-                                       int (*read)(void *, uint8_t *, int),
-                                       int (*write)(void *, uint8_t *, int),
-                                       int64_t (*seek)(void *, int64_t, int)) {
-    if (fails(call::allocation)) return nullptr;
-    return made(__real_avio_alloc_context(buf, size, writable, opaque, read, write, seek));
-}
-void __wrap_avio_context_free(AVIOContext **io) {
-    given_back(*io);
-    __real_avio_context_free(io);
-}
-int __wrap_av_dict_set(AVDictionary **dict, const char *key, const char *value, int flags) {
-    if (fails(call::allocation)) return AVERROR(ENOMEM);
-    return __real_av_dict_set(dict, key, value, flags);
-}
-int __wrap_av_read_frame(AVFormatContext *ctx, AVPacket *packet) {
-    return fails(call::allocation) ? AVERROR(ENOMEM) : __real_av_read_frame(ctx, packet);
 }
 
 AVVorbisParseContext *__real_av_vorbis_parse_init(const uint8_t *data, int bytes);

@@ -75,6 +75,7 @@ convert mono.wav core.aac -c:a aac -b:a 32k -ar 22050
 # MP4: the same frames in every shape of container
 convert low.aac last.m4a -c:a copy -bsf:a aac_adtstoasc
 convert low.aac first.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart
+convert high.aac high.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart
 convert low.aac fragmented.mp4 -c:a copy -bsf:a aac_adtstoasc \
   -movflags +delay_moov+default_base_moof -frag_duration 700000
 ffmpeg -nostdin -v error -y -f lavfi -i testsrc=size=64x64:rate=10:duration=12 -i low.aac \

@@ -21,10 +21,8 @@ struct bit_reader {
 uint32_t get(bit_reader *r, int32_t count) {
     uint32_t value = 0;
     for (int32_t i = 0; i < count; ++i) {
-        if (r->at >= r->bits) {
-            r->failed = true;
-            return 0;
-        }
+        r->failed = r->failed || r->at >= r->bits;
+        if (r->failed) return 0;
         value = value << 1 | (static_cast<uint32_t>(r->data[r->at / 8]) >> (7 - r->at % 8) & 1U);
         ++r->at;
     }
@@ -96,19 +94,11 @@ int64_t aac_config_from_program(aac_config *config, const uint8_t *data, int32_t
     const uint32_t data_elements = copy(&r, &w, 3);
     const uint32_t coupling = copy(&r, &w, 4);
     for (const int32_t bits : kMixdownBits) {
-        if (copy(&r, &w, 1) != 0) {
-            copy(&r, &w, bits);
-        }
+        if (copy(&r, &w, 1) != 0) copy(&r, &w, bits);
     }
-    for (uint32_t i = 0; i < front + side + back; ++i) {
-        copy(&r, &w, 5);
-    }
-    for (uint32_t i = 0; i < low + data_elements; ++i) {
-        copy(&r, &w, 4);
-    }
-    for (uint32_t i = 0; i < coupling; ++i) {
-        copy(&r, &w, 5);
-    }
+    for (uint32_t i = 0; i < front + side + back; ++i) copy(&r, &w, 5);
+    for (uint32_t i = 0; i < low + data_elements; ++i) copy(&r, &w, 4);
+    for (uint32_t i = 0; i < coupling; ++i) copy(&r, &w, 5);
     r.at = (r.at + 7) / 8 * 8;
     r.at += static_cast<int64_t>(get(&r, 8)) * 8;  // a comment, left out of the copy
     w.at = (w.at + 7) / 8 * 8;
@@ -119,9 +109,7 @@ int64_t aac_config_from_program(aac_config *config, const uint8_t *data, int32_t
 
 bool aac_config_read(aac_config *config, const void *data, int32_t bytes) {
     *config = {};
-    if (data == nullptr || bytes < 2 || bytes > kAacMaxConfig) {
-        return false;
-    }
+    if (data == nullptr || bytes < 2 || bytes > kAacMaxConfig) return false;
     memcpy(config->bytes, data, static_cast<size_t>(bytes));
     config->size = bytes;
     bit_reader r = {config->bytes, static_cast<int64_t>(bytes) * 8, 0, false};
@@ -130,9 +118,7 @@ bool aac_config_read(aac_config *config, const void *data, int32_t bytes) {
         config->object_type = 32 + static_cast<int32_t>(get(&r, 6));
     }
     config->rate_index = static_cast<int32_t>(get(&r, 4));
-    if (config->rate_index == kRateEscape) {
-        get(&r, 24);
-    }
+    if (config->rate_index == kRateEscape) get(&r, 24);
     config->channels = static_cast<int32_t>(get(&r, 4));
     config->short_frames = config->object_type == kAacLowComplexity && get(&r, 1) != 0;
     return !r.failed;

@@ -1,7 +1,7 @@
 // The AudioSpecificConfig of an AAC stream: what a decoder must be told before raw blocks.
 //
 // In: fields of an ADTS or ADIF header, or the configuration that an MP4 track carries. Out: bytes
-// for the set-up data of a bundle (aac_stream.h).
+// for the decoder's set-up data.
 #ifndef WEXAAUDIO_AAC_CONFIG_H
 #define WEXAAUDIO_AAC_CONFIG_H
 

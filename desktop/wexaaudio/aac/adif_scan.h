@@ -5,13 +5,11 @@
 #ifndef WEXAAUDIO_ADIF_SCAN_H
 #define WEXAAUDIO_ADIF_SCAN_H
 
-#include <cstdint>
-
 #include "desktop/wexaaudio/aac/aac_stream.h"
 
-// Fills s->config and s->index from the "ADIF" at offset start of s->file. Nothing is known behind
-// a damaged block: the stream ends before it. False when there is no block, on a read error and
-// when out of memory.
-bool adif_scan(aac_stream *s, int64_t start);
+// Reads from the "ADIF" at offset start. Nothing is known behind a damaged block: the stream ends
+// before it. False when there is no block, on a read error and when out of memory.
+bool adif_scan(io_file *file, const codec_library *library, int64_t start, aac_config *config,
+               frame_index *frames);
 
 #endif

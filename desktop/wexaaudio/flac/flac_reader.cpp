@@ -1,242 +1,248 @@
-// FLAC files: open, frame by frame, exact seeks.
+// FLAC files, decoded by libFLAC. Positions are the sample numbers of the frames, so that a frame
+// that is missing or does not decode leaves silence of its length.
 //
-// A frame that is too large for the source's buffer is decoded here and handed out as finished PCM,
-// piece by piece.
+// In: mtsrc_io. Out: front left and right as 16-bit pairs, one channel twice; the information
+// record.
+#include <FLAC/stream_decoder.h>
+
 #include <algorithm>
 #include <cstddef>
 #include <cstdlib>
 #include <cstring>
 
-#include "desktop/wexaaudio/flac/flac_scan.h"
-#include "desktop/wexaaudio/shared/av_decoder.h"
-#include "desktop/wexaaudio/shared/bundle.h"
-#include "desktop/wexaaudio/shared/tags.h"
+#include "desktop/wexaaudio/shared/io_file.h"
 #include "desktop/wexaaudio/shared/units.h"
 #include "media_source/wexaaudio.h"
 
 namespace {
 
-constexpr int32_t kChannels = 2;                               // of all PCM of this format
-constexpr int32_t kSampleFrame = kChannels * sizeof(int16_t);  // bytes
-constexpr int64_t kMaxCommentBytes = 1 << 20;
+constexpr int32_t kPair = 2 * sizeof(int16_t);  // bytes
+constexpr int32_t kMinFrame = 10;               // bytes: header, one constant subframe, check sum
 
 struct flac_reader {
     uint8_t reserved[kFlacReaderFlag];
     uint8_t flag;  // set by the source before every read; nothing depends on it
     io_file file;
-    flac_stream stream;
-    wexa_tags *tags;
-    int64_t next;       // frame read next
-    int32_t skip;       // sample frames cut from its front
-    av_decoder av;      // for frames decoded here; opened when one is met
-    uint8_t *big;       // a compressed frame decoded here, owned
-    uint8_t *pcm;       // [pcm_total][2] its PCM, owned; null when none is being handed out
-    int32_t pcm_total;  // sample frames
-    int32_t pcm_done;   // sample frames handed out
+    FLAC__StreamDecoder *decoder;  // owned
+    int64_t at;                    // offset that the decoder reads next
+    int32_t rate;                  // Hz
+    int32_t max_block;             // sample frames
+    int64_t stated;                // sample frames by the stream information, 0 unknown
+    int64_t base;                  // number of the stream's first sample
+    int64_t end;                   // sample frames
+    int64_t next;                  // sample handed out next
+    int16_t *pcm;                  // [max_block][2] owned; the block decoded last
+    int64_t block;                 // its first sample
+    int32_t count;                 // its sample frames; 0 without one
+    bool damaged;                  // the frame being decoded has a wrong check sum
 };
 static_assert(offsetof(flac_reader, flag) == kFlacReaderFlag);
 
-void read_tags(flac_reader *r) {
-    const int64_t bytes = std::min(r->stream.comment_bytes, kMaxCommentBytes);
-    r->tags = r->stream.comment >= 0 ? tags_create() : nullptr;
-    uint8_t *block = r->tags != nullptr
-                         ? static_cast<uint8_t *>(malloc(static_cast<size_t>(bytes) + 1))
-                         : nullptr;
-    if (block != nullptr) {
-        const int64_t got = io_file_read(&r->file, r->stream.comment, block, bytes);
-        tags_from_vorbis(r->tags, block, static_cast<size_t>(std::max<int64_t>(got, 0)));
-        free(block);
+flac_reader *reader_of(void *client) {
+    return static_cast<flac_reader *>(client);
+}
+
+FLAC__StreamDecoderReadStatus read_bytes(const FLAC__StreamDecoder * /*decoder*/, FLAC__byte buf[],
+                                         size_t *bytes, void *client) {
+    flac_reader *r = reader_of(client);
+    const int64_t got = io_file_read(&r->file, r->at, buf, static_cast<int64_t>(*bytes));
+    *bytes = static_cast<size_t>(std::max<int64_t>(got, 0));
+    if (got < 0) return FLAC__STREAM_DECODER_READ_STATUS_ABORT;
+    r->at += got;
+    return got == 0 ? FLAC__STREAM_DECODER_READ_STATUS_END_OF_STREAM
+                    : FLAC__STREAM_DECODER_READ_STATUS_CONTINUE;
+}
+
+FLAC__StreamDecoderSeekStatus move_to(const FLAC__StreamDecoder * /*decoder*/, FLAC__uint64 offset,
+                                      void *client) {
+    reader_of(client)->at = static_cast<int64_t>(offset);
+    return FLAC__STREAM_DECODER_SEEK_STATUS_OK;
+}
+
+FLAC__StreamDecoderTellStatus tell(const FLAC__StreamDecoder * /*decoder*/, FLAC__uint64 *offset,
+                                   void *client) {
+    *offset = static_cast<FLAC__uint64>(reader_of(client)->at);
+    return FLAC__STREAM_DECODER_TELL_STATUS_OK;
+}
+
+FLAC__StreamDecoderLengthStatus get_length(const FLAC__StreamDecoder * /*decoder*/,
+                                           FLAC__uint64 *length, void *client) {
+    *length = static_cast<FLAC__uint64>(reader_of(client)->file.size);
+    return FLAC__STREAM_DECODER_LENGTH_STATUS_OK;
+}
+
+FLAC__bool is_at_end(const FLAC__StreamDecoder * /*decoder*/, void *client) {
+    const flac_reader *r = reader_of(client);
+    return r->at >= r->file.size ? 1 : 0;
+}
+
+void take_info(const FLAC__StreamDecoder * /*decoder*/, const FLAC__StreamMetadata *metadata,
+               void *client) {
+    flac_reader *r = reader_of(client);
+    const FLAC__StreamMetadata_StreamInfo &info = metadata->data.stream_info;
+    r->max_block = static_cast<int32_t>(info.max_blocksize);
+    r->stated = static_cast<int64_t>(info.total_samples);
+}
+
+void take_error(const FLAC__StreamDecoder * /*decoder*/, FLAC__StreamDecoderErrorStatus status,
+                void *client) {
+    if (status == FLAC__STREAM_DECODER_ERROR_STATUS_FRAME_CRC_MISMATCH) {
+        reader_of(client)->damaged = true;
     }
 }
 
-// Decodes one frame with its check sum verified. Returns its sample frames, 0 or less when it is
-// damaged or cut.
-int32_t decode_here(flac_reader *r, const frame_entry &entry) {
-    const av_setup setup = {r->stream.raw_info, kFlacInfoBytes, 0, 0, true};
-    if (r->av.ctx == nullptr && !av_decoder_open(&r->av, "flac", &setup)) {
-        return -1;
-    }
-    free(r->big);
-    r->big = static_cast<uint8_t *>(malloc(static_cast<size_t>(entry.bytes) + 1));
-    if (r->big == nullptr) {
-        return -1;
-    }
-    const int64_t got = io_file_read(&r->file, entry.offset, r->big, entry.bytes);
-    return got > 0 ? av_decoder_decode(&r->av, r->big, static_cast<int32_t>(got)) : -1;
-}
-
-// A last frame that the end of the file cuts is not there.
-void settle_last(flac_reader *r) {
-    frame_index *index = &r->stream.index;
-    if (r->stream.last_unsure && index->count > 0) {
-        const frame_entry &last = index->entry[index->count - 1];
-        if (decode_here(r, last) < last.samples) {
-            --index->count;
+// One channel of a block as every second sample of pcm.
+void take_channel(const FLAC__int32 *in, int32_t bits, int32_t count, int16_t *pcm) {
+    if (bits <= 16) {
+        for (ptrdiff_t i = 0; i < count; ++i) {
+            pcm[2 * i] = static_cast<int16_t>(in[i] * (1 << (16 - bits)));
         }
+        return;
+    }
+    const int32_t half = 1 << (bits - 17);  // rounded to nearest, up at half; the top is clipped
+    for (ptrdiff_t i = 0; i < count; ++i) {
+        const int32_t high = (in[i] >> (bits - 16)) + ((in[i] & half) != 0 ? 1 : 0);
+        pcm[2 * i] = static_cast<int16_t>(std::min(high, 32767));
     }
 }
 
-void drop_pcm(flac_reader *r) {
-    free(r->pcm);
-    r->pcm = nullptr;
+// A frame with a wrong check sum is not taken: not even its number can be trusted.
+FLAC__StreamDecoderWriteStatus take_block(const FLAC__StreamDecoder * /*decoder*/,
+                                          const FLAC__Frame *frame,
+                                          const FLAC__int32 *const buffer[], void *client) {
+    flac_reader *r = reader_of(client);
+    const FLAC__FrameHeader &head = frame->header;
+    const auto count = static_cast<int32_t>(head.blocksize);
+    const bool usable = !r->damaged && count <= r->max_block;
+    r->damaged = false;
+    r->count = usable ? count : 0;
+    if (!usable) return FLAC__STREAM_DECODER_WRITE_STATUS_CONTINUE;
+    r->block = static_cast<int64_t>(head.number.sample_number) - r->base;
+    if (r->rate == 0) r->rate = static_cast<int32_t>(head.sample_rate);
+    const auto bits = static_cast<int32_t>(head.bits_per_sample);
+    take_channel(buffer[0], bits, count, r->pcm);
+    take_channel(buffer[head.channels > 1 ? 1 : 0], bits, count, r->pcm + 1);
+    return FLAC__STREAM_DECODER_WRITE_STATUS_CONTINUE;
 }
 
-// Decodes a frame that no buffer of the source can hold; a damaged one becomes silence.
-bool start_pcm(flac_reader *r, const frame_entry &entry) {
-    const int32_t bytes = entry.samples * kSampleFrame;
-    r->pcm = static_cast<uint8_t *>(calloc(static_cast<size_t>(entry.samples), kSampleFrame));
-    r->pcm_total = entry.samples;
-    r->pcm_done = r->skip;
-    if (r->pcm == nullptr) {
-        return false;
-    }
-    if (decode_here(r, entry) > 0) {
-        av_decoder_pcm(&r->av, kAvFront, 0, 0, -1, r->pcm, bytes);
+// The next block that can be used. False at the end of what is readable.
+bool decode_block(flac_reader *r) {
+    r->count = 0;
+    while (r->count == 0) {
+        if (FLAC__stream_decoder_process_single(r->decoder) == 0) return false;
+        const FLAC__StreamDecoderState state = FLAC__stream_decoder_get_state(r->decoder);
+        if (r->count == 0 && state >= FLAC__STREAM_DECODER_END_OF_STREAM) return false;
     }
     return true;
 }
 
-int32_t write_pcm(flac_reader *r, void *buf, int32_t size) {
-    const int64_t room = size - bundle_size(0, 1, 0);
-    const int32_t samples =
-        static_cast<int32_t>(std::min<int64_t>(room / kSampleFrame, r->pcm_total - r->pcm_done));
-    if (samples < 1) {
-        return -1;
-    }
-    bundle_head head = {};
-    head.flags = kBundlePcm;
-    head.channels = kChannels;
-    head.samples = samples;
-    head.frames = 1;
-    bundle_writer w = {};
-    bundle_begin(&w, buf, size, head, nullptr);
-    uint8_t *space = bundle_add(&w, samples * kSampleFrame);
-    if (space == nullptr) {
-        return -1;
-    }
-    memcpy(space, r->pcm + static_cast<ptrdiff_t>(r->pcm_done) * kSampleFrame,
-           static_cast<size_t>(samples) * kSampleFrame);
-    r->pcm_done += samples;
-    return bundle_end(&w);
+// Back to the first frame.
+bool rewind_stream(flac_reader *r) {
+    r->count = 0;
+    return FLAC__stream_decoder_reset(r->decoder) != 0 &&
+           FLAC__stream_decoder_process_until_end_of_metadata(r->decoder) != 0;
 }
 
-// Returns the bytes written, 0 when the file ends early, -1 on failure.
-int32_t write_frame(flac_reader *r, const frame_entry &entry, void *buf, int32_t size) {
-    bundle_head head = {};
-    head.flags = entry.bytes == 0 ? kBundleLost : 0;
-    head.channels = kChannels;
-    head.samples = entry.samples - r->skip;
-    head.skip = r->skip;
-    head.setup = kFlacInfoBytes;
-    head.frames = entry.bytes == 0 ? 0 : 1;
-    bundle_writer w = {};
-    bundle_begin(&w, buf, size, head, r->stream.raw_info);
-    if (entry.bytes > 0) {
-        uint8_t *space = bundle_add(&w, entry.bytes);
-        if (space == nullptr) {
-            return -1;
-        }
-        const int64_t got = io_file_read(&r->file, entry.offset, space, entry.bytes);
-        if (got != entry.bytes) {
-            return got < 0 ? -1 : 0;
-        }
-    }
-    return bundle_end(&w);
+// Decodes the block that holds a sample; the block then starts there. False where none holds it.
+bool find_sample(flac_reader *r, int64_t sample) {
+    r->count = 0;
+    r->damaged = false;
+    const auto number = static_cast<FLAC__uint64>(r->base + sample);
+    return FLAC__stream_decoder_flush(r->decoder) != 0 &&  // out of a seek that failed
+           FLAC__stream_decoder_seek_absolute(r->decoder, number) != 0 && r->count > 0;
 }
 
-// The next bundle: a piece of the frame being handed out, or the next frame.
-int32_t write_next(flac_reader *r, const frame_entry &entry, void *buf, int32_t size) {
-    const bool fits = bundle_size(kFlacInfoBytes, 1, entry.bytes) <= size;
-    if (fits && r->pcm == nullptr) {
-        return write_frame(r, entry, buf, size);
+// Where the audio that is there ends: the stated end when a seek finds the sample before it. Else
+// the file is cut, or does not say: the last sample that a seek finds, and on from there.
+bool find_end(flac_reader *r) {
+    const int64_t most = std::min(r->file.size / kMinFrame * r->max_block, kMaxSamples - r->base);
+    if (r->stated > 0 && r->stated <= most && find_sample(r, r->stated - 1)) {
+        r->end = r->stated;
+        return true;
     }
-    if (r->pcm == nullptr && !start_pcm(r, entry)) {
-        return -1;
+    int64_t low = 0;
+    for (int64_t high = r->stated > 0 ? std::min(r->stated, most) : most;
+         high - low > r->max_block;) {
+        const int64_t middle = low + (high - low) / 2;
+        (find_sample(r, middle) ? low : high) = middle;
     }
-    return write_pcm(r, buf, size);
+    bool more = find_sample(r, low) || (rewind_stream(r) && decode_block(r));
+    for (; more; more = decode_block(r)) {
+        if (r->block + r->count <= most) r->end = std::max(r->end, r->block + r->count);
+    }
+    return !r->file.failed && r->end > 0;
+}
+
+bool open_decoder(flac_reader *r) {
+    r->decoder = FLAC__stream_decoder_new();
+    if (r->decoder == nullptr ||
+        FLAC__stream_decoder_init_stream(r->decoder, read_bytes, move_to, tell, get_length,
+                                         is_at_end, take_block, take_info, take_error,
+                                         r) != FLAC__STREAM_DECODER_INIT_STATUS_OK ||
+        FLAC__stream_decoder_process_until_end_of_metadata(r->decoder) == 0 || r->max_block <= 0) {
+        return false;
+    }
+    r->pcm = static_cast<int16_t *>(calloc(static_cast<size_t>(r->max_block), kPair));
+    if (r->pcm == nullptr || !decode_block(r) || r->rate <= 0) return false;
+    r->base = r->block;
+    return find_end(r) && rewind_stream(r);
 }
 
 }  // namespace
 
-int32_t xflac_init(void) {
-    return 0;
-}
-
-void xflac_deinit(void) {}
-
 void *xflacfd_create(const mtsrc_io *io, int64_t * /*word*/, xflac_info *info,
                      void * /*reserved*/) {
-    flac_reader *r = static_cast<flac_reader *>(calloc(1, sizeof(flac_reader)));
-    if (r == nullptr || info == nullptr || !io_file_open(&r->file, io) ||
-        !flac_scan(&r->file, &r->stream)) {
+    auto *r = static_cast<flac_reader *>(calloc(1, sizeof(flac_reader)));
+    if (r == nullptr || info == nullptr || !io_file_open(&r->file, io) || !open_decoder(r)) {
         xflacfd_delete(r);
         return nullptr;
     }
-    settle_last(r);
-    read_tags(r);
-    info->sample_rate = r->stream.first.rate;
-    info->duration = units_of_duration(frame_index_end(&r->stream.index), r->stream.first.rate);
-    info->tags = r->tags;
+    info->sample_rate = r->rate;
+    info->duration = units_of_duration(r->end, r->rate);
     return r;
 }
 
 int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                         int64_t *second) {
-    flac_reader *r = static_cast<flac_reader *>(reader);
-    if (r == nullptr || buf == nullptr || bytes == nullptr) {
+    flac_reader *r = reader_of(reader);
+    if (r == nullptr || buf == nullptr || bytes == nullptr || first == nullptr ||
+        second == nullptr || size < kPair) {
         return -1;
     }
-    if (r->next >= r->stream.index.count) {
-        return 1;
+    if (r->next >= r->end) return kWexaEndOfStream;
+    bool more = true;
+    while (more && (r->count == 0 || r->block + r->count <= r->next)) more = decode_block(r);
+    if (r->file.failed) return -1;
+    const int64_t inside = r->next - r->block;  // below 0 in silence before the block
+    const int64_t left = std::min<int64_t>(r->end - r->next, size / kPair);
+    const int64_t samples = std::min(left, !more ? left : inside < 0 ? -inside : r->count - inside);
+    *bytes = static_cast<int32_t>(samples) * kPair;
+    if (more && inside >= 0) {
+        memcpy(buf, r->pcm + 2 * inside, static_cast<size_t>(*bytes));
+    } else {
+        memset(buf, 0, static_cast<size_t>(*bytes));
     }
-    const frame_entry &entry = r->stream.index.entry[r->next];
-    const int32_t before = r->pcm != nullptr ? r->pcm_done : r->skip;
-    const int32_t got = write_next(r, entry, buf, size);
-    if (got <= 0) {
-        return got < 0 ? -1 : 1;
-    }
-    const int32_t rate = r->stream.first.rate;
-    const int32_t samples = r->pcm != nullptr ? r->pcm_done - before : entry.samples - before;
-    *bytes = got;
-    if (first != nullptr) {
-        *first = units_from_samples(entry.first + before, rate);
-    }
-    if (second != nullptr) {
-        *second = units_from_samples(samples, rate);
-    }
-    if (r->pcm == nullptr || r->pcm_done == r->pcm_total) {
-        drop_pcm(r);
-        r->skip = 0;
-        ++r->next;
-    }
+    *first = units_from_samples(r->next, r->rate);
+    *second = units_from_samples(samples, r->rate);
+    r->next += samples;
     return 0;
 }
 
 int32_t xflacfd_seek(void *reader, const int64_t *position, int64_t *reached) {
-    flac_reader *r = static_cast<flac_reader *>(reader);
-    if (r == nullptr || position == nullptr || reached == nullptr) {
-        return -1;
-    }
-    const frame_index *index = &r->stream.index;
-    const int32_t rate = r->stream.first.rate;
-    const int64_t end = frame_index_end(index);
-    const int64_t sample = seek_target(*position, end, rate);
-    drop_pcm(r);
-    r->next = sample < end ? frame_index_find(index, sample) : index->count;
-    r->skip = sample < end ? static_cast<int32_t>(sample - index->entry[r->next].first) : 0;
-    *reached = units_from_samples(sample, rate);
-    return 0;
+    flac_reader *r = reader_of(reader);
+    if (r == nullptr || position == nullptr || reached == nullptr) return -1;
+    r->next = seek_target(*position, r->end, r->rate);
+    *reached = units_from_samples(r->next, r->rate);
+    // Where no seek leads, reading goes on from the start, up to the place.
+    const bool found = r->next >= r->end || find_sample(r, r->next) || rewind_stream(r);
+    return found ? 0 : -1;
 }
 
 void xflacfd_delete(void *reader) {
-    flac_reader *r = static_cast<flac_reader *>(reader);
-    if (r != nullptr) {
-        drop_pcm(r);
-        free(r->big);
-        av_decoder_close(&r->av);
-        frame_index_free(&r->stream.index);
-        tags_delete(r->tags);
-        io_file_close(&r->file);
-        free(r);
-    }
+    flac_reader *r = reader_of(reader);
+    if (r == nullptr) return;
+    if (r->decoder != nullptr) FLAC__stream_decoder_delete(r->decoder);
+    free(r->pcm);
+    io_file_close(&r->file);
+    free(r);
 }

@@ -66,14 +66,6 @@ int32_t mpeg_main_data_at(const mpeg_header *h) {
     return kMpegHeaderBytes + (h->has_crc ? 2 : 0) + side;
 }
 
-int32_t mpeg_backstep(const mpeg_header *h, const uint8_t *p) {
-    if (h->layer != 3) {
-        return 0;
-    }
-    const uint8_t *side = p + kMpegHeaderBytes + (h->has_crc ? 2 : 0);
-    return h->version == 1 ? side[0] << 1 | side[1] >> 7 : side[0];
-}
-
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes) {
     if (h->layer != 3) {
         return false;

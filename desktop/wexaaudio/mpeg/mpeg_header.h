@@ -5,9 +5,11 @@
 
 #include <cstdint>
 
+#include "desktop/wexaaudio/shared/stream.h"
+
 constexpr int32_t kMpegHeaderBytes = 4;
 constexpr int32_t kMpegMaxFrame = 1732;    // bytes: Layer II, 384 kbit/s at 32 kHz, padded
-constexpr int32_t kMpegMaxBackstep = 511;  // bytes of main data before a Layer III frame
+constexpr int32_t kMpegMaxBackstep = 511;  // bytes of main data that a Layer III frame reaches back
 
 struct mpeg_header {
     int32_t version;   // 1, 2, or 25 for 2.5
@@ -28,12 +30,11 @@ bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
 // Bytes from a Layer III frame's start to its main data.
 int32_t mpeg_main_data_at(const mpeg_header *h);
 
-// How many bytes before its main data a Layer III frame reaches back; 0 for the other layers. p
-// holds the frame's first 8 bytes.
-int32_t mpeg_backstep(const mpeg_header *h, const uint8_t *p);
-
 // Whether a stream's first frame carries an encoder's table (Xing, Info, VBRI) in place of music. p
 // holds the frame, bytes of it.
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
+
+// How a stream of such frames is decoded, whatever holds it.
+void mpeg_describe(const mpeg_header *head, stream_info *info);
 
 #endif

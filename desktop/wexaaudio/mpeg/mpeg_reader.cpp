@@ -1,132 +1,173 @@
-// Bare MPEG audio files: open, frame by frame, exact seeks.
+// Bare MPEG audio files, Layers I to III: one scan over the frame headers, past tags and garbage.
+//
+// In: mtsrc_io. Out: PCM, the information record.
 //
 // Positions of seeks and the duration count the PCM that the source delivers. Of a 44.1-kHz stereo
 // stream it drops the start of the first frame, so a sample lies that much later in what is
 // decoded. The times that come with the frames count what is decoded: 0 marks the first frame,
 // whole.
 #include <algorithm>
-#include <cstdlib>
+#include <cstring>
 
-#include "desktop/wexaaudio/mpeg/mpeg_frames.h"
-#include "desktop/wexaaudio/mpeg/mpeg_scan.h"
-#include "desktop/wexaaudio/shared/tags.h"
-#include "desktop/wexaaudio/shared/units.h"
+#include "desktop/wexaaudio/mpeg/mpeg_header.h"
+#include "desktop/wexaaudio/shared/id3v2.h"
+#include "desktop/wexaaudio/shared/stream.h"
 #include "media_source/wexaaudio.h"
 
 namespace {
 
-constexpr int32_t kDropRate = 44100;       // Hz
-constexpr int64_t kMaxTagBytes = 1 << 20;  // of an ID3v2 tag looked through
+constexpr int32_t kDropRate = 44100;  // Hz
 
-struct mpeg_reader {
-    io_file file;
-    mpeg_stream stream;
-    wexa_tags *tags;
-    int64_t dropped;  // sample frames that the source drops at the start
-    int64_t next;     // frame read next
-    int32_t skip;     // sample frames cut from its front
-    bool fresh;       // a seek came before it
+constexpr int32_t kId3v1Bytes = 128;
+constexpr int32_t kApeFooter = 32;            // bytes, also of the header
+constexpr int32_t kLook = 4 * kMpegMaxFrame;  // bytes looked at to believe a header
+constexpr int32_t kFirstChain = 3;            // headers in a row that start the stream
+constexpr int32_t kResyncChain = 2;           // and that continue it after garbage
+
+struct mpeg_scan {
+    io_file *file;
+    int64_t end;       // of the audio: where the tags at the file's end begin
+    int64_t at;        // offset
+    mpeg_header head;  // of the stream's first frame, once started
+    bool started;
 };
 
-void read_tags(mpeg_reader *r) {
-    const int64_t bytes = std::min(r->stream.tag_bytes, kMaxTagBytes);
-    r->tags = r->stream.tag >= 0 ? tags_create() : nullptr;
-    uint8_t *tag =
-        r->tags != nullptr ? static_cast<uint8_t *>(malloc(static_cast<size_t>(bytes))) : nullptr;
-    if (tag != nullptr) {
-        const int64_t got = io_file_read(&r->file, r->stream.tag, tag, bytes);
-        tags_from_id3v2(r->tags, tag, static_cast<size_t>(std::max<int64_t>(got, 0)));
-        free(tag);
-    }
+// Bytes of the tag that ends at end; 0 without one.
+int64_t tag_before(io_file *file, int64_t end) {
+    const uint8_t *p = io_file_bytes(file, end - kId3v1Bytes, kId3v1Bytes);
+    if (p == nullptr) return 0;
+    if (memcmp(p, "TAG", 3) == 0) return kId3v1Bytes;
+    p += kId3v1Bytes - kApeFooter;
+    if (memcmp(p, "APETAGEX", 8) != 0) return 0;
+    const int64_t size =
+        static_cast<int64_t>(p[12]) | p[13] << 8 | p[14] << 16 | static_cast<int64_t>(p[15]) << 24;
+    const int64_t whole = size + ((p[23] & 0x80) != 0 ? kApeFooter : 0);
+    return size >= kApeFooter && whole <= end ? whole : 0;
 }
 
-// Sample frames that the source delivers in all.
-int64_t delivered(const mpeg_reader *r) {
-    return std::max<int64_t>(frame_index_end(&r->stream.index) - r->dropped, 0);
+// Where the audio ends: before any ID3v1 and APE tags.
+int64_t find_end(io_file *file) {
+    int64_t end = file->size;
+    for (int64_t tag = -1; tag != 0; end -= tag) tag = tag_before(file, end);
+    return end;
+}
+
+// Whether p (got bytes, to_end bytes of audio) starts a chain of headers of one stream, or one that
+// ends exactly with the audio.
+bool starts_chain(const mpeg_scan *s, const uint8_t *p, int32_t got, int64_t to_end,
+                  mpeg_header *first) {
+    const mpeg_header *like = s->started ? &s->head : nullptr;
+    const int32_t links = s->started ? kResyncChain : kFirstChain;
+    mpeg_header h = {};
+    int64_t at = 0;
+    for (int32_t i = 0; i < links; ++i) {
+        if (at == to_end) return i > 0;
+        if (at + kMpegHeaderBytes > std::min<int64_t>(got, to_end) || !mpeg_parse(p + at, &h) ||
+            (like != nullptr && !mpeg_same_stream(&h, like))) {
+            return false;
+        }
+        if (i == 0) *first = h;
+        if (like == nullptr) like = first;
+        at += h.bytes;
+    }
+    return true;
+}
+
+// The next place at or after s->at where the stream starts or goes on. Skips ID3v2 tags whole.
+// False at the end.
+bool find_chain(mpeg_scan *s, mpeg_header *first) {
+    while (s->at < s->end) {
+        int32_t got = 0;
+        const uint8_t *p = io_file_peek(s->file, s->at, kLook, &got);
+        if (p == nullptr || got < kMpegHeaderBytes) return false;
+        // Only the last block of the file is looked at to its end.
+        const int32_t sure = s->at + got >= s->end ? got : got - kLook + 1;
+        int64_t tag = 0;
+        int32_t i = 0;
+        for (; i < sure && tag == 0; ++i) {
+            if (p[i] == 'I' && got - i >= kId3v2Head) tag = id3v2_bytes(p + i);
+            if (p[i] == 0xFF && starts_chain(s, p + i, got - i, s->end - s->at - i, first)) {
+                s->at += i;
+                return true;
+            }
+        }
+        s->at += tag > 0 ? i - 1 + tag : i;
+    }
+    return false;
+}
+
+// The first frame of music, behind the encoder's table.
+bool find_start(mpeg_scan *s) {
+    if (!find_chain(s, &s->head)) return false;
+    s->started = true;
+    int32_t got = 0;
+    const uint8_t *p = io_file_peek(s->file, s->at, kMpegMaxFrame, &got);
+    if (p == nullptr || !mpeg_is_info_frame(&s->head, p, std::min(got, s->head.bytes))) {
+        return p != nullptr;
+    }
+    s->at += s->head.bytes;
+    return find_chain(s, &s->head);
+}
+
+// Frame after frame from s->at to the end; one that the end of the file cuts is not there. False on
+// a read error, when out of memory, and without a frame.
+bool walk(mpeg_scan *s, frame_index *frames) {
+    mpeg_header h = {};
+    while (s->end - s->at >= kMpegHeaderBytes) {
+        const uint8_t *p = io_file_bytes(s->file, s->at, kMpegHeaderBytes);
+        if (p == nullptr) break;
+        const bool follows = mpeg_parse(p, &h) && mpeg_same_stream(&h, &s->head);
+        if (!follows && !find_chain(s, &h)) break;
+        if (h.bytes > s->end - s->at) break;
+        if (!frame_index_add(frames, s->at, h.bytes, h.samples)) return false;
+        s->at += h.bytes;
+    }
+    return !s->file->failed && frames->count > 0;
+}
+
+bool scan_file(io_file *file, const codec_library * /*library*/, stream_info *info) {
+    mpeg_scan s = {file, find_end(file), 0, {}, false};
+    if (!find_start(&s) || !walk(&s, &info->frames)) return false;
+    mpeg_describe(&s.head, info);
+    if (s.head.rate == kDropRate && s.head.channels == 2) {
+        info->delay = std::min(kWexaMpegDelay, s.head.samples);
+    }
+    return true;
 }
 
 }  // namespace
 
-int32_t xmp123_init(void) {
-    return 0;
+void mpeg_describe(const mpeg_header *head, stream_info *info) {
+    info->codec = "mp3float";  // all three layers
+    info->rate = head->rate;
+    info->channels = head->channels;
+    info->out_channels = head->channels;
+    // The filter bank's memory spans two frames at most (Layer I; Layer III of MPEG-2). One more is
+    // margin, since it costs next to nothing.
+    info->preroll = 3;
+    info->reservoir = head->layer == 3 ? kMpegMaxBackstep : 0;
+    info->overhead = mpeg_main_data_at(head);
 }
-
-void xmp123_deinit(void) {}
 
 void *xmp123fd_create(const mtsrc_io *io, int64_t * /*word*/, xmp123_info *info,
                       void * /*reserved*/) {
-    mpeg_reader *r = static_cast<mpeg_reader *>(calloc(1, sizeof(mpeg_reader)));
-    if (r == nullptr || info == nullptr || !io_file_open(&r->file, io) ||
-        !mpeg_scan(&r->file, &r->stream)) {
-        xmp123fd_delete(r);
-        return nullptr;
-    }
-    const mpeg_header &head = r->stream.head;
-    if (head.rate == kDropRate && head.channels == 2) {
-        r->dropped = std::min<int64_t>(kWexaMpegDelay, head.samples);
-    }
-    read_tags(r);
-    info->sample_rate = head.rate;
-    info->channels = head.channels;
-    info->duration = units_of_duration(delivered(r), head.rate);
-    info->tags = r->tags;
+    stream_reader *r = info != nullptr ? stream_open(io, scan_file) : nullptr;
+    if (r == nullptr) return nullptr;
+    info->sample_rate = r->info->rate;
+    info->channels = r->info->channels;
+    info->duration = stream_duration(r);
     return r;
 }
 
 int32_t xmp123fd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                          int64_t *second) {
-    mpeg_reader *r = static_cast<mpeg_reader *>(reader);
-    if (r == nullptr || buf == nullptr || bytes == nullptr) {
-        return -1;
-    }
-    if (r->next >= r->stream.index.count) {
-        return 1;
-    }
-    const mpeg_header &head = r->stream.head;
-    const int32_t got = mpeg_frames_read(&r->file, &r->stream.index, r->next, r->fresh, r->skip,
-                                         head.channels, buf, size);
-    if (got <= 0) {
-        return got < 0 ? -1 : 1;
-    }
-    const frame_entry &entry = r->stream.index.entry[r->next];
-    *bytes = got;
-    if (first != nullptr) {
-        *first = units_from_samples(entry.first + r->skip, head.rate);
-    }
-    if (second != nullptr) {
-        *second = units_from_samples(entry.samples - r->skip, head.rate);
-    }
-    ++r->next;
-    r->skip = 0;
-    r->fresh = false;
-    return 0;
+    return stream_read(static_cast<stream_reader *>(reader), buf, size, bytes, first, second);
 }
 
 int32_t xmp123fd_seek(void *reader, const int64_t *position, int64_t *reached) {
-    mpeg_reader *r = static_cast<mpeg_reader *>(reader);
-    if (r == nullptr || position == nullptr || reached == nullptr) {
-        return -1;
-    }
-    const frame_index *index = &r->stream.index;
-    const int32_t rate = r->stream.head.rate;
-    const int64_t end = delivered(r);
-    const int64_t sample = seek_target(*position, end, rate);
-    // At the start the source drops; anywhere else, in the first frame too, the frame's time is not
-    // 0, so that nothing is dropped twice.
-    const int64_t decoded = sample > 0 ? sample + r->dropped : 0;
-    r->next = sample < end ? frame_index_find(index, decoded) : index->count;
-    r->skip = sample < end ? static_cast<int32_t>(decoded - index->entry[r->next].first) : 0;
-    r->fresh = true;
-    *reached = units_from_samples(sample, rate);
-    return 0;
+    return stream_seek(static_cast<stream_reader *>(reader), position, reached);
 }
 
 void xmp123fd_delete(void *reader) {
-    mpeg_reader *r = static_cast<mpeg_reader *>(reader);
-    if (r != nullptr) {
-        frame_index_free(&r->stream.index);
-        tags_delete(r->tags);
-        io_file_close(&r->file);
-        free(r);
-    }
+    stream_close(static_cast<stream_reader *>(reader));
 }

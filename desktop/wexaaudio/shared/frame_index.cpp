@@ -5,50 +5,32 @@
 
 #include "desktop/wexaaudio/shared/units.h"
 
-namespace {
-
-constexpr int64_t kFirstRoom = 1024;  // entries
-
-bool before(int64_t sample, const frame_entry &entry) {
-    return sample < entry.first;
-}
-
-}  // namespace
-
-bool frame_index_add(frame_index *index, frame_entry entry) {
-    if (entry.first < 0) {
-        entry.first = frame_index_end(index);
-    }
-    if (entry.first > kMaxSamples) {
-        return false;
-    }
+bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples) {
+    constexpr int64_t kFirstRoom = 1024;     // entries
+    constexpr int64_t kMaxFrames = 1 << 22;  // more than a day of song; a damaged count says more
+    const int64_t first = frame_index_end(index);
+    if (first > kMaxSamples || index->count == kMaxFrames) return false;
     if (index->count == index->room) {
         const int64_t room = std::max(kFirstRoom, index->room * 2);
         void *grown = realloc(index->entry, static_cast<size_t>(room) * sizeof(frame_entry));
-        if (grown == nullptr) {
-            return false;
-        }
+        if (grown == nullptr) return false;
         index->entry = static_cast<frame_entry *>(grown);
         index->room = room;
     }
-    index->entry[index->count++] = entry;
+    index->entry[index->count++] = {offset, first, bytes, samples};
     return true;
 }
 
 int64_t frame_index_find(const frame_index *index, int64_t sample) {
-    if (index->count == 0) {
-        return -1;
-    }
     const frame_entry *begin = index->entry;
-    const frame_entry *end = begin + index->count;
-    const frame_entry *after = std::upper_bound(begin, end, sample, before);
+    const frame_entry *after =
+        std::upper_bound(begin, begin + index->count, sample,
+                         [](int64_t at, const frame_entry &entry) { return at < entry.first; });
     return std::max<int64_t>(after - begin - 1, 0);
 }
 
 int64_t frame_index_end(const frame_index *index) {
-    if (index->count == 0) {
-        return 0;
-    }
+    if (index->count == 0) return 0;
     const frame_entry &last = index->entry[index->count - 1];
     return last.first + last.samples;
 }

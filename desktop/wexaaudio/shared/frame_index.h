@@ -1,5 +1,5 @@
-// What one scan of a file finds: every frame with its place in the file and in the stream. Made at
-// open; durations and seeks are looked up here, never estimated.
+// Every frame of a stream with its place in the file and in the stream. Made once at open;
+// durations and seeks are looked up here, never estimated.
 #ifndef WEXAAUDIO_FRAME_INDEX_H
 #define WEXAAUDIO_FRAME_INDEX_H
 
@@ -9,7 +9,7 @@ struct frame_entry {
     int64_t offset;   // bytes from the start of the file
     int64_t first;    // the frame's first sample in the decoded stream, sample frames
     int32_t bytes;    // of the whole frame
-    int32_t samples;  // sample frames that it decodes to
+    int32_t samples;  // sample frames that it gives
 };
 
 struct frame_index {
@@ -18,12 +18,12 @@ struct frame_index {
     int64_t room;
 };
 
-// Appends; first is set by the index to the end of the frame before when it is negative. False when
-// out of memory or past kMaxSamples, with the index unchanged.
-bool frame_index_add(frame_index *index, frame_entry entry);
+// Appends a frame that begins where the last one ends. False when out of memory or when no song has
+// so many frames or samples, with the index unchanged.
+bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples);
 
 // Number of the frame that holds sample: the last whose first is at or before it; 0 before the
-// first frame, count - 1 past the end; -1 on an empty index.
+// first frame, count - 1 past the end. The index must not be empty.
 int64_t frame_index_find(const frame_index *index, int64_t sample);
 
 // End of the last frame, sample frames; 0 when empty.

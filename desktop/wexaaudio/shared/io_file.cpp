@@ -10,11 +10,8 @@ namespace {
 // failure.
 int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
     if (f->at != offset) {
-        f->at = -1;
-        if (f->io.seek(f->file, &offset) != 0) {
-            return -1;
-        }
-        f->at = offset;
+        f->at = f->io.seek(f->file, &offset) == 0 ? offset : -1;
+        if (f->at < 0) return -1;
     }
     int64_t done = 0;
     while (done < count) {
@@ -24,13 +21,26 @@ int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
             f->at = -1;
             return -1;
         }
-        if (got == 0) {
-            break;
-        }
+        if (got == 0) break;
         done += got;
         f->at += got;
     }
     return done;
+}
+
+// Makes the block start at offset. What it holds of the place is not read again.
+bool fill_block(io_file *f, int64_t offset) {
+    const int64_t held_end = f->block_at + f->block_got;
+    int32_t keep = 0;
+    if (offset >= f->block_at && offset < held_end) {
+        keep = static_cast<int32_t>(held_end - offset);
+        memmove(f->block, f->block + (offset - f->block_at), static_cast<size_t>(keep));
+    }
+    f->block_at = offset;
+    const int64_t more = read_raw(f, offset + keep, f->block + keep, kIoBlock - keep);
+    f->failed = f->failed || more < 0;
+    f->block_got = more < 0 ? 0 : keep + static_cast<int32_t>(more);
+    return more >= 0;
 }
 
 }  // namespace
@@ -42,82 +52,45 @@ bool io_file_open(io_file *f, const mtsrc_io *io) {
         return false;
     }
     f->io = *io;
-    f->at = 0;
-    f->room = kIoBlock;
     f->block = static_cast<uint8_t *>(malloc(kIoBlock));
     f->file = f->block != nullptr ? io->open(io, 0) : nullptr;
-    if (f->file == nullptr || f->io.size(f->file, &f->size) != 0 || f->size < 0) {
-        io_file_close(f);
-        return false;
-    }
-    return true;
-}
-
-bool io_file_widen(io_file *f, int32_t look) {
-    if (look <= f->room / 2) {
-        return true;
-    }
-    void *grown =
-        look <= INT32_MAX / 2 ? realloc(f->block, static_cast<size_t>(look) * 2) : nullptr;
-    if (grown == nullptr) {
-        return false;
-    }
-    f->block = static_cast<uint8_t *>(grown);
-    f->room = look * 2;
-    return true;
+    if (f->file != nullptr && f->io.size(f->file, &f->size) == 0 && f->size >= 0) return true;
+    io_file_close(f);
+    return false;
 }
 
 void io_file_close(io_file *f) {
-    if (f->file != nullptr) {
-        f->io.close(f->file);
-    }
+    if (f->file != nullptr) f->io.close(f->file);
     free(f->block);
     *f = {};
 }
 
 const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *got) {
     *got = 0;
-    if (offset < 0 || offset >= f->size || want > f->room / 2) {
-        return nullptr;
-    }
-    const int64_t want_end = std::min(offset + want, f->size);
-    if (offset < f->block_at || want_end > f->block_at + f->block_got ||
-        offset >= f->block_at + f->block_got) {
-        // What the block already holds of the place moves to its front and is not read again.
-        const int64_t held_end = f->block_at + f->block_got;
-        int32_t keep = 0;
-        if (offset >= f->block_at && offset < held_end) {
-            keep = static_cast<int32_t>(held_end - offset);
-            memmove(f->block, f->block + (offset - f->block_at), static_cast<size_t>(keep));
-        }
-        f->block_at = offset;
-        f->block_got = keep;
-        const int64_t more = read_raw(f, offset + keep, f->block + keep, f->room - keep);
-        if (more < 0) {
-            f->failed = true;
-            f->block_got = 0;
-            return nullptr;
-        }
-        f->block_got += static_cast<int32_t>(more);
-    }
+    if (offset < 0 || offset >= f->size || want > kMaxLook) return nullptr;
+    const int64_t want_end = std::min(offset + std::max(want, 1), f->size);
+    const bool held = offset >= f->block_at && want_end <= f->block_at + f->block_got;
+    if (!held && !fill_block(f, offset)) return nullptr;
     *got = static_cast<int32_t>(f->block_at + f->block_got - offset);
     return *got > 0 ? f->block + (offset - f->block_at) : nullptr;
 }
 
+const uint8_t *io_file_bytes(io_file *f, int64_t offset, int32_t count) {
+    int32_t got = 0;
+    const uint8_t *p = io_file_peek(f, offset, count, &got);
+    return got >= count ? p : nullptr;
+}
+
 int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count) {
-    if (offset < 0 || count < 0) {
-        return -1;
-    }
-    if (count > f->room / 2) {
+    if (offset < 0 || count < 0) return -1;
+    if (count > kMaxLook) {
         const int64_t got = read_raw(f, offset, static_cast<uint8_t *>(buf), count);
         f->failed = f->failed || got < 0;
         return got;
     }
     int32_t held = 0;
     const uint8_t *at = io_file_peek(f, offset, static_cast<int32_t>(count), &held);
-    if (at == nullptr) {
-        return f->failed ? -1 : 0;
-    }
+    if (at == nullptr) return f->failed ? -1 : 0;
     const int64_t copied = std::min<int64_t>(count, held);
     memcpy(buf, at, static_cast<size_t>(copied));
     return copied;

@@ -7,15 +7,15 @@
 
 #include "media_source/mtsrc_io.h"
 
-constexpr int32_t kIoBlock = 262144;  // bytes read ahead at first
+constexpr int32_t kIoBlock = 262144;        // bytes read ahead
+constexpr int32_t kMaxLook = kIoBlock / 2;  // bytes that a look-ahead may ask for
 
 struct io_file {
     mtsrc_io io;        // copy: the callbacks stay callable while the reader is deleted
     mtsrc_file *file;   // owned
     int64_t size;       // bytes, when the file was opened
     int64_t at;         // offset of the handle, -1 unknown
-    uint8_t *block;     // [room] owned
-    int32_t room;       // bytes; a look-ahead must not exceed half of it
+    uint8_t *block;     // [kIoBlock] owned
     int64_t block_at;   // offset of block[0]
     int32_t block_got;  // bytes held
     bool failed;        // a read or seek has failed
@@ -23,9 +23,6 @@ struct io_file {
 
 // Opens io's file read-only. False on failure, with nothing held. *f may be uninitialised.
 bool io_file_open(io_file *f, const mtsrc_io *io);
-
-// Makes look-aheads of look bytes possible. False when out of memory, with nothing changed.
-bool io_file_widen(io_file *f, int32_t look);
 
 // Releases what *f holds; harmless on a zeroed or closed record.
 void io_file_close(io_file *f);
@@ -35,8 +32,11 @@ void io_file_close(io_file *f);
 int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count);
 
 // The buffered bytes at offset: *got receives how many lie there, at least min(want, bytes to the
-// end of the file), often more. want <= room / 2. Returns null at the end of the file, before
-// its start and on a read error (then failed is set); the pointer is valid until the next call.
+// end of the file), often more. want <= kMaxLook. Returns null at the end of the file, before its
+// start and on a read error (then failed is set); the pointer is valid until the next call.
 const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *got);
+
+// The same for exactly count bytes; null when the file has fewer there.
+const uint8_t *io_file_bytes(io_file *f, int64_t offset, int32_t count);
 
 #endif

@@ -95,9 +95,7 @@ bool read_chunks(io_file *f, wav_head *head) {
     int64_t at = kRiffHead;
     for (int32_t i = 0; i < kMaxChunks && !(head->has_format && head->has_data); ++i) {
         p = io_file_peek(f, at, kChunkHead + kExtensibleBytes, &got);
-        if (p == nullptr || got < kChunkHead) {
-            return !f->failed;
-        }
+        if (p == nullptr || got < kChunkHead) return !f->failed;
         const uint32_t size = le32(p + 4);
         const int64_t body = std::min<int64_t>(got - kChunkHead, size);
         if (memcmp(p, "fmt ", 4) == 0 && body >= kFormatBytes && !head->has_format) {
@@ -119,9 +117,8 @@ bool read_chunks(io_file *f, wav_head *head) {
 // Fills the record for the reasons of a refusal too. False when the header is too broken to say
 // anything: the record stays empty.
 bool fill_info(xwav_info *info, const wav_head *head) {
-    if (!head->has_format || head->channels == 0 || head->rate == 0 || head->rate > INT32_MAX) {
+    if (!head->has_format || head->channels == 0 || head->rate == 0 || head->rate > INT32_MAX)
         return false;
-    }
     info->codec = head->tag == kTagPcm    ? kWexaPcm
                   : head->tag == kWexaPcm ? head->tag | kTagCollision
                                           : head->tag;
@@ -134,7 +131,7 @@ bool fill_info(xwav_info *info, const wav_head *head) {
 }  // namespace
 
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t * /*word*/) {
-    wav_reader *reader = static_cast<wav_reader *>(calloc(1, sizeof(wav_reader)));
+    auto *reader = static_cast<wav_reader *>(calloc(1, sizeof(wav_reader)));
     if (reader == nullptr || info == nullptr || !io_file_open(&reader->file, io)) {
         free(reader);
         return nullptr;
@@ -155,36 +152,27 @@ void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t * /*word*/) {
 
 int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                       int64_t *second) {
-    wav_reader *r = static_cast<wav_reader *>(reader);
-    if (r == nullptr || buf == nullptr || bytes == nullptr || size < r->block) {
+    auto *r = static_cast<wav_reader *>(reader);
+    if (r == nullptr || buf == nullptr || bytes == nullptr || first == nullptr ||
+        second == nullptr || size < r->block) {
         return -1;
     }
     const int64_t frames = std::min<int64_t>(size / r->block, r->total - r->next);
-    if (frames <= 0) {
-        return 1;
-    }
+    if (frames <= 0) return kWexaEndOfStream;
     const int64_t got =
         io_file_read(&r->file, r->data + r->next * r->block, buf, frames * r->block);
-    if (got < r->block) {
-        return got < 0 ? -1 : 1;
-    }
+    if (got < r->block) return got < 0 ? -1 : kWexaEndOfStream;
     const int64_t whole = got / r->block;
-    if (first != nullptr) {
-        *first = units_from_samples(r->next, r->rate);
-    }
-    if (second != nullptr) {
-        *second = units_from_samples(whole, r->rate);
-    }
+    *first = units_from_samples(r->next, r->rate);
+    *second = units_from_samples(whole, r->rate);
     r->next += whole;
     *bytes = static_cast<int32_t>(whole * r->block);
     return 0;
 }
 
 int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32_t /*flags*/) {
-    wav_reader *r = static_cast<wav_reader *>(reader);
-    if (r == nullptr || seconds == nullptr || reached == nullptr) {
-        return -1;
-    }
+    auto *r = static_cast<wav_reader *>(reader);
+    if (r == nullptr || seconds == nullptr || reached == nullptr) return -1;
     const int64_t wanted = std::max<int64_t>(*seconds, 0);
     r->next = wanted > r->total / r->rate ? r->total : std::min(wanted * r->rate, r->total);
     *reached = units_from_samples(r->next, r->rate);
@@ -192,9 +180,8 @@ int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32
 }
 
 void xwavd_delete(void *reader) {
-    wav_reader *r = static_cast<wav_reader *>(reader);
-    if (r != nullptr) {
-        io_file_close(&r->file);
-        free(r);
-    }
+    auto *r = static_cast<wav_reader *>(reader);
+    if (r == nullptr) return;
+    io_file_close(&r->file);
+    free(r);
 }

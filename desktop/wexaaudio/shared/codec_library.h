@@ -1,0 +1,57 @@
+// libavcodec as a table of functions. It brings a hundred shared objects along, so its callers stay
+// in libwexaaudio.so, and what calls it is a private shared object beside that, libwexaaudio_av.so,
+// which is loaded when a file first needs it: AAC, MPEG audio, MP4 and Ogg do.
+#ifndef WEXAAUDIO_CODEC_LIBRARY_H
+#define WEXAAUDIO_CODEC_LIBRARY_H
+
+#include <cstdint>
+
+struct av_decoder;     // one decoder, used by one thread at a time
+struct vorbis_parser;  // tells the length of Vorbis packets
+
+constexpr int32_t kCodecNoMemory = -2;
+constexpr int32_t kMaxPacket = 1 << 24;  // bytes, also of set-up data
+
+struct codec_library {
+    // A decoder by libavcodec's name, with set-up data (copied; may be null). Null on failure.
+    av_decoder *(*open)(const char *name, const uint8_t *setup, int32_t setup_bytes);
+    void (*close)(av_decoder *decoder);  // null is allowed
+
+    // Room for the next packet of bytes, 1 to kMaxPacket, to be filled before decode. Null when out
+    // of memory.
+    uint8_t *(*packet)(av_decoder *decoder, int32_t bytes);
+
+    // Decodes the packet. Returns the sample frames now held (0: nothing came), -1 when it cannot
+    // be decoded, kCodecNoMemory.
+    int32_t (*decode)(av_decoder *decoder);
+
+    // Rate in Hz and channels of what is held; 0 when nothing is.
+    void (*format)(const av_decoder *decoder, int32_t *rate, int32_t *channels);
+
+    // Writes what is held from sample frame skip on, at most count sample frames, as interleaved
+    // 16-bit PCM: rounded to nearest, clipped, without dither. channels 2: front left and right,
+    // one channel twice. channels 1: the mean of all, toward zero. Returns the sample frames
+    // written.
+    int32_t (*pcm)(const av_decoder *decoder, int32_t channels, int32_t skip, int32_t count,
+                   int16_t *pcm);
+
+    // Decodes the blocks of the packet, which have no framing, up to the first that begins behind
+    // stop. begin receives the offset in the packet of each block that decodes, ascending, at most
+    // room of them. Returns their count. The decoder is left fresh.
+    int32_t (*split)(av_decoder *decoder, int32_t stop, int32_t *begin, int32_t room);
+
+    // setup: the three header packets in Xiph's packing. Null on failure.
+    vorbis_parser *(*parser_open)(const uint8_t *setup, int32_t setup_bytes);
+    void (*parser_close)(vorbis_parser *parser);  // null is allowed
+    // Sample frames of the next packet by its first byte; 0 or less when it carries no audio.
+    int32_t (*parser_samples)(vorbis_parser *parser, uint8_t first);
+};
+
+// The name of the table in libwexaaudio_av.so.
+extern "C" const codec_library wexaaudio_av;
+
+// The table, loaded on the first call of any thread. Null when it cannot be loaded: a line of the
+// log names what is missing.
+const codec_library *codec_library_get(void);
+
+#endif

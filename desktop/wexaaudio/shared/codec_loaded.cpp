@@ -1,0 +1,45 @@
+// The table from libwexaaudio_av.so, which lies beside the library that this file is part of. It
+// stays loaded until the process ends.
+#include <android/log.h>
+#include <dlfcn.h>
+#include <pthread.h>
+
+#include <cstdio>
+#include <cstring>
+
+#include "desktop/wexaaudio/shared/codec_library.h"
+
+namespace {
+
+constexpr char kName[] = "libwexaaudio_av.so";
+
+pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
+const codec_library *loaded;  // under lock
+
+const codec_library *load() {
+    // By its full path: the sanitizers' dlopen does not know this library's own search path.
+    Dl_info self = {};
+    char path[4096];
+    if (dladdr(&lock, &self) == 0) return nullptr;
+    const char *slash = strrchr(self.dli_fname, '/');
+    const int folder = slash != nullptr ? static_cast<int>(slash + 1 - self.dli_fname) : 0;
+    snprintf(path, sizeof path, "%.*s%s", folder, self.dli_fname, kName);
+    void *library = dlopen(path, RTLD_LAZY | RTLD_LOCAL);
+    void *table = library != nullptr ? dlsym(library, "wexaaudio_av") : nullptr;
+    if (table == nullptr) {
+        __android_log_print(ANDROID_LOG_ERROR, "wexaaudio",
+                            "%s, which decodes AAC, MPEG audio, MP4 and Ogg, cannot be loaded: %s",
+                            kName, dlerror());
+    }
+    return static_cast<const codec_library *>(table);
+}
+
+}  // namespace
+
+const codec_library *codec_library_get(void) {
+    pthread_mutex_lock(&lock);
+    if (loaded == nullptr) loaded = load();
+    const codec_library *table = loaded;
+    pthread_mutex_unlock(&lock);
+    return table;
+}

@@ -1,0 +1,159 @@
+#include "desktop/wexaaudio/shared/stream.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+
+#include "desktop/wexaaudio/shared/scan_cache.h"
+#include "desktop/wexaaudio/shared/units.h"
+#include "media_source/wexaaudio.h"
+
+namespace {
+
+constexpr int32_t kFailed = -3;  // a read error; kCodecNoMemory ends a read as well
+
+// The first frame to decode so that frame n comes out as in a linear read.
+int64_t first_needed(const stream_info *info, int64_t n) {
+    if (info->group > 0) n -= n % info->group;
+    n = std::max<int64_t>(n - info->preroll, 0);
+    for (int32_t left = info->reservoir; left > 0 && n > 0;) {
+        --n;
+        left -= std::max(info->frames.entry[n].bytes - info->overhead, 1);
+    }
+    return n;
+}
+
+// Returns the sample frames held, 0 when the frame does not decode, else why reading ends.
+int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
+    if (entry.bytes <= 0 || entry.bytes > kMaxPacket) return 0;
+    uint8_t *packet = r->library->packet(r->decoder, entry.bytes);
+    if (packet == nullptr) return kCodecNoMemory;
+    if (stream_copy(&r->file, r->info, entry.offset, packet, entry.bytes) != entry.bytes) {
+        return kFailed;
+    }
+    const int32_t held = r->library->decode(r->decoder);
+    return held == -1 ? 0 : held;
+}
+
+// Decodes frame next, behind what it needs.
+int32_t decode_next(stream_reader *r) {
+    const stream_info *info = r->info;
+    int64_t n = r->next;
+    if (r->fresh || (info->group > 0 && n % info->group == 0)) {
+        r->library->close(r->decoder);
+        r->decoder = r->library->open(info->codec, info->setup, info->setup_bytes);
+        if (r->decoder == nullptr) return kCodecNoMemory;
+        n = first_needed(info, n);
+        r->fresh = false;
+    }
+    int32_t held = 0;
+    for (; n <= r->next && held >= 0; ++n) held = decode_frame(r, info->frames.entry[n]);
+    return held;
+}
+
+}  // namespace
+
+stream_reader *stream_open(const mtsrc_io *io, stream_scan scan) {
+    auto *r = static_cast<stream_reader *>(calloc(1, sizeof(stream_reader)));
+    if (r == nullptr) return nullptr;
+    r->fresh = true;
+    r->library = codec_library_get();
+    if (r->library != nullptr && io_file_open(&r->file, io)) {
+        r->info = scan_cache_get(&r->file, r->library, scan);
+    }
+    if (r->info != nullptr) return r;
+    stream_close(r);
+    return nullptr;
+}
+
+void stream_close(stream_reader *r) {
+    if (r == nullptr) return;
+    if (r->decoder != nullptr) r->library->close(r->decoder);
+    scan_cache_put(r->info);
+    io_file_close(&r->file);
+    free(r);
+}
+
+int64_t stream_duration(const stream_reader *r) {
+    const int64_t samples = frame_index_end(&r->info->frames) - r->info->delay;
+    return r->info->rate > 0 ? units_of_duration(std::max<int64_t>(samples, 0), r->info->rate) : 0;
+}
+
+int32_t stream_read(stream_reader *r, void *buf, int32_t size, int32_t *bytes, int64_t *first,
+                    int64_t *second) {
+    if (r == nullptr || buf == nullptr || bytes == nullptr || first == nullptr ||
+        second == nullptr || r->info->codec == nullptr) {
+        return -1;
+    }
+    const stream_info *info = r->info;
+    int32_t held = 0;
+    int32_t samples = 0;
+    for (; samples == 0; ++r->next) {
+        if (r->next >= info->frames.count) return kWexaEndOfStream;
+        held = decode_next(r);
+        if (held < 0) return -1;
+        samples = info->frames.entry[r->next].samples - r->skip;
+    }
+    const int64_t n = r->next - 1;
+    const int32_t frame = info->out_channels * static_cast<int32_t>(sizeof(int16_t));
+    if (samples > size / frame) return -1;
+    auto *pcm = static_cast<int16_t *>(buf);
+    const int32_t from = r->skip + (n == info->cut_frame ? info->cut_samples : 0);
+    const int32_t got =
+        held > from ? r->library->pcm(r->decoder, info->out_channels, from, samples, pcm) : 0;
+    *bytes = samples * frame;
+    memset(static_cast<uint8_t *>(buf) + got * frame, 0, static_cast<size_t>(*bytes - got * frame));
+    *first = units_from_samples(info->frames.entry[n].first + r->skip, info->rate);
+    *second = units_from_samples(samples, info->rate);
+    r->skip = 0;
+    return 0;
+}
+
+int32_t stream_seek(stream_reader *r, const int64_t *position, int64_t *reached) {
+    if (r == nullptr || position == nullptr || reached == nullptr || r->info->codec == nullptr) {
+        return -1;
+    }
+    const frame_index *frames = &r->info->frames;
+    const int64_t end = std::max<int64_t>(frame_index_end(frames) - r->info->delay, 0);
+    const int64_t sample = seek_target(*position, end, r->info->rate);
+    // At the start the source drops; anywhere else, in the first frame too, the frame's time is not
+    // 0, so that nothing is dropped twice.
+    const int64_t decoded = sample > 0 ? sample + r->info->delay : 0;
+    r->next = sample < end ? frame_index_find(frames, decoded) : frames->count;
+    r->skip = sample < end ? static_cast<int32_t>(decoded - frames->entry[r->next].first) : 0;
+    r->fresh = true;
+    *reached = units_from_samples(sample, r->info->rate);
+    return 0;
+}
+
+int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
+                    int64_t bytes) {
+    if (info->pages.count == 0) return io_file_read(file, offset, buf, bytes);
+    int64_t done = 0;
+    for (int64_t i = frame_index_find(&info->pages, offset); i < info->pages.count; ++i) {
+        const frame_entry &page = info->pages.entry[i];
+        const int64_t skip = offset + done - page.first;
+        const int64_t piece = std::min(bytes - done, page.bytes - skip);
+        if (piece <= 0) break;
+        const int64_t got = io_file_read(file, page.offset + skip, buf + done, piece);
+        if (got < 0) return -1;
+        done += got;
+        if (got < piece || done == bytes) break;
+    }
+    return done;
+}
+
+bool stream_set_up(stream_info *info, const uint8_t *setup, int32_t bytes) {
+    free(info->setup);
+    info->setup_bytes = bytes;
+    info->setup = static_cast<uint8_t *>(malloc(static_cast<size_t>(bytes)));
+    if (info->setup != nullptr) memcpy(info->setup, setup, static_cast<size_t>(bytes));
+    return info->setup != nullptr;
+}
+
+void stream_info_free(stream_info *info) {
+    frame_index_free(&info->frames);
+    frame_index_free(&info->pages);
+    free(info->setup);
+    info->setup = nullptr;
+}

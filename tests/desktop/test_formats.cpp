@@ -1,0 +1,320 @@
+// What every format's reader owes, on the files of the fixtures.
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+
+#include "media_source/format_table.h"
+#include "tests/desktop/codec_test.h"
+
+namespace codec_test {
+namespace {
+
+class Seams : public testing::TestWithParam<const char *> {};
+
+TEST_P(Seams, AreExact) {
+    expect_exact_seams(fixture(GetParam()));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Files, Seams,
+    testing::Values("cbr.mp3", "cbr48.mp3", "vbr.mp3", "vbr_no_table.mp3", "checked.mp3",
+                    "mono.mp3", "lsf.mp3", "low.mp3", "tagged.mp3", "layer2.mp2",
+                    "golden/layer1_44.mp1", "golden/layer1_48.mp1", "song.flac", "no_table.flac",
+                    "short_blocks.flac", "huge_blocks.flac", "mono.flac", "six.flac", "wide.flac",
+                    "noise.flac", "golden/variable.flac", "golden/late.flac", "low.aac",
+                    "noisy.aac", "high.aac", "mono.aac", "six.aac", "core.aac", "golden/he.aac",
+                    "golden/plain.adif", "last.m4a", "first.m4a", "fragmented.mp4", "video.mp4",
+                    "tagged.m4a", "layer3.mp4", "stereo3.mp4", "golden/he.m4a", "song.ogg",
+                    "other.ogg", "mono.ogg", "six.ogg", "video.ogv", "golden/late.ogg",
+                    "golden/front.ogg", "golden/end.ogg"));
+
+TEST(Files, HoldTheSameSamples) {
+    const struct {
+        const char *file, *like;
+        size_t skip = 0;          // samples of the second that the first lacks at its start
+        size_t count = SIZE_MAX;  // of the first at most
+    } pairs[] = {
+        // Without loss, whatever the blocks and with or without a table for seeking.
+        {"song.flac", "song.wav"},
+        {"no_table.flac", "song.wav"},
+        {"short_blocks.flac", "song.wav"},
+        {"huge_blocks.flac", "song.wav"},
+        {"mono.flac", "mono.wav"},
+        {"six.flac", "six.wav"},
+        {"golden/late.flac", "golden/plain.flac"},
+        {"golden/variable.flac", "golden/plain.flac", 0, 8192},
+        // The frame with the encoder's table is no music.
+        {"vbr.mp3", "vbr_no_table.mp3"},
+        // The same frames, however they are packed and whatever is beside them.
+        {"golden/plain.adif", "golden/plain.aac"},
+        {"golden/program.aac", "golden/plain.aac"},
+        {"golden/he.m4a", "golden/he_every.aac"},
+        {"last.m4a", "low.aac"},
+        {"first.m4a", "low.aac"},
+        {"fragmented.mp4", "low.aac"},
+        {"video.mp4", "low.aac"},
+        {"tagged.m4a", "low.aac"},
+        {"video.ogv", "song.ogg"},
+        // Of a mono stream the bare source drops nothing and averages nothing.
+        {"layer3.mp4", "mono.mp3"},
+        // Vorbis is cut where its granule positions say.
+        {"golden/late.ogg", "golden/plain.ogg"},
+        {"golden/front.ogg", "golden/plain.ogg", 700},
+    };
+    for (const auto &pair : pairs) {
+        SCOPED_TRACE(pair.file);
+        const samples like = read_all(fixture(pair.like));
+        const size_t end = std::min(like.size(), pair.count);
+        expect_same(read_all(fixture(pair.file)), {like.begin() + static_cast<ptrdiff_t>(pair.skip),
+                                                   like.begin() + static_cast<ptrdiff_t>(end)});
+    }
+    samples cut = read_all(fixture("golden/plain.ogg"));
+    cut.resize(cut.size() - 700);
+    expect_same(read_all(fixture("golden/end.ogg")), cut);
+    // Of a stereo stream the bare source drops the start; of a first frame of 384 samples, that.
+    EXPECT_EQ(read_all(fixture("stereo3.mp4")).size(), read_all(fixture("cbr.mp3")).size() + 529);
+    EXPECT_EQ(read_all(fixture("golden/layer1_44.mp1")).size(), 19U * 384);
+    EXPECT_EQ(read_all(fixture("golden/layer1_48.mp1")).size(), 20U * 384);
+}
+
+// Left channel of a 24-bit stereo WAV file, rounded to 16 bits.
+samples rounded_left(const std::string &path) {
+    const bytes file = load(path);
+    const uint8_t name[] = {'d', 'a', 't', 'a'};
+    const auto data = std::search(file.begin(), file.end(), name, name + 4) + 8;
+    samples out;
+    for (auto at = data; at + 6 <= file.end(); at += 6) {
+        const int32_t wide = at[0] << 8 | at[1] << 16 | static_cast<int32_t>(at[2]) << 24;
+        out.push_back(
+            static_cast<int16_t>(std::min((int64_t{wide} + 0x8000) >> 16, int64_t{32767})));
+    }
+    return out;
+}
+
+// 24 bits at 96 kHz; and noise in blocks of 65,535 samples, which no buffer of the source can hold.
+TEST(Flac, RoundsTwentyFourBits) {
+    expect_same(read_all(fixture("wide.flac")), rounded_left(fixture("wide.wav")));
+    expect_same(read_all(fixture("noise.flac")), rounded_left(fixture("noise.wav")));
+    EXPECT_EQ(opened(fixture("wide.flac")).format.sample_rate, 96000);
+}
+
+// The headers say 22,050 Hz; decoding says 44,100 Hz, 2048 samples a frame. A mono stream comes out
+// as two equal channels.
+TEST(Aac, LearnsTheTruthFromTheFrames) {
+    for (const char *name : {"golden/he_every.aac", "golden/he.aac", "golden/he.m4a"}) {
+        const opened file(fixture(name));
+        ASSERT_NE(file.source, nullptr) << name;
+        EXPECT_EQ(file.format.sample_rate, 44100);
+        EXPECT_EQ(file.format.duration * 44100 / kUnits % 2048, 0);
+    }
+    const std::string path = fixture("mono.aac");
+    const mtsrc_io io = io_for(path);
+    int64_t word = 0;
+    xaac_info info = {};
+    void *reader = xaacfd_create(&io, &word, &info, nullptr);
+    ASSERT_NE(reader, nullptr);
+    EXPECT_EQ(info.channels, 1);
+    const xaac_config config = {{1, 2, 2, 0}, 3, info.sample_rate, info.channels, 0};
+    void *decoder = xaacd_create(&config, nullptr);
+    EXPECT_EQ(aac_get_hz(reader, decoder), 44100);
+    samples pcm(12288);
+    int32_t size = 0;
+    int64_t first = 0;
+    int64_t length = 0;
+    ASSERT_EQ(xaacfd_get_frm(reader, pcm.data(), 24576, &size, &first, &length), 0);
+    EXPECT_EQ(size, 4096);
+    EXPECT_EQ(first, 232'200);  // 1024 samples, rounded up
+    for (size_t i = 0; i < 1024; ++i) ASSERT_EQ(pcm[2 * i], pcm[2 * i + 1]);
+    xaacd_delete(decoder);
+    xaacfd_delete(reader);
+}
+
+// Where a new decoder starts, every few seconds, nothing is to be heard. This file has no
+// substituted noise, which differs from one decoder to the next.
+TEST(Aac, ComesOutAsFromOneDecoder) {
+    const std::string path = save("one.raw", {});
+    const std::string command = "ffmpeg -nostdin -v error -y -i " + fixture("high.aac") +
+                                " -af 'pan=mono|c0=c0' -f s16le " + path;
+    ASSERT_EQ(std::system(command.c_str()), 0);
+    const bytes raw = load(path);
+    const samples got = read_all(fixture("high.aac"));
+    ASSERT_GT(got.size(), 500U * 1024);
+    ASSERT_EQ(raw.size(), 2 * got.size());
+    for (size_t i = 0; i < got.size(); ++i) {
+        const int wanted = static_cast<int16_t>(raw[2 * i] | raw[2 * i + 1] << 8);
+        ASSERT_LE(std::abs(got[i] - wanted), 1) << i;
+    }
+}
+
+// The channels of a file of 16-bit samples behind a 44-byte header, and their mean.
+std::vector<samples> wav_channels(const std::string &path) {
+    const bytes file = load(path);
+    std::vector<samples> channels(file[22]);
+    for (size_t i = 44; i + 2 <= file.size(); i += 2) {
+        channels[(i - 44) / 2 % channels.size()].push_back(
+            static_cast<int16_t>(file[i] | file[i + 1] << 8));
+    }
+    samples mean(channels[0].size());
+    for (size_t i = 0; i < mean.size(); ++i) {
+        int sum = 0;
+        for (const samples &channel : channels) sum += channel[i];
+        mean[i] = static_cast<int16_t>(sum / static_cast<int>(channels.size()));
+    }
+    channels.push_back(mean);
+    return channels;
+}
+
+// Mean square of the difference to a channel that comes so many samples late, over a second.
+double distance(const samples &got, const samples &channel, size_t late) {
+    double sum = 0;
+    for (size_t i = 120'000; i < 164'100; ++i) {
+        const double d = got[i + late] - channel[i];
+        sum += d * d;
+    }
+    return sum / 44'100;
+}
+
+// Where loss is allowed, the right channel still comes out at the right place: at any other it is
+// farther away.
+TEST(LossyFiles, HaveTheSongInItsPlace) {
+    const struct {
+        const char *file, *song;
+        bool mean;  // of the channels; the first one alone otherwise
+        size_t late;
+        int clear;  // how many times the loss the song's power is at least
+    } files[] = {
+        // The encoder delays by 576, the decoder by 529 of which the source drops as many.
+        {"vbr.mp3", "song.wav", true, 576, 100},    {"high.aac", "song48.wav", false, 1024, 100},
+        {"mono.aac", "mono.wav", false, 1024, 100}, {"six.aac", "six.wav", false, 1024, 300},
+        {"song.ogg", "song.wav", true, 0, 100},     {"mono.ogg", "mono.wav", true, 0, 100},
+        {"six.ogg", "six.wav", true, 0, 20},
+    };
+    for (const auto &each : files) {
+        SCOPED_TRACE(each.file);
+        const samples got = read_all(fixture(each.file));
+        const std::vector<samples> channels = wav_channels(fixture(each.song));
+        const samples &wanted = each.mean ? channels.back() : channels.front();
+        const samples &wrong = each.mean ? channels.front() : channels.back();
+        EXPECT_TRUE(each.late != 0 || got.size() == wanted.size());
+        const double near = distance(got, wanted, each.late);
+        EXPECT_GT(distance(wanted, samples(wanted.size()), 0), each.clear * near);
+        if (channels.size() > 2) {
+            EXPECT_GT(distance(got, wrong, each.late), 4 * near);
+        }
+        for (size_t late = each.late < 16 ? 0 : each.late - 16; late < each.late + 16; ++late) {
+            if (late == each.late) continue;
+            EXPECT_LT(near, distance(got, wanted, late)) << late;
+        }
+    }
+}
+
+// The file delivers one byte at a time to the readers; recognition, which opens it first, asks for
+// whole heads.
+mtsrc_file *recognised;
+
+int64_t read_a_byte(mtsrc_file *file, void *buf, int32_t count) {
+    return mtsrc_file_read(file, buf, file == recognised ? count : std::min(count, 1));
+}
+
+TEST(Files, MayDeliverOneByteAtATime) {
+    for (const char *name :
+         {"song.wav", "cbr.mp3", "song.flac", "low.aac", "last.m4a", "song.ogg"}) {
+        SCOPED_TRACE(name);
+        mtsrc_io io = io_for(fixture(name));
+        io.path = strdup(fixture(name).c_str());  // the source's, once it is open
+        io.read = read_a_byte;
+        io.open = [](const mtsrc_io *of, int32_t mode) {
+            mtsrc_file *opened = mtsrc_file_open(of, mode);
+            if (recognised == nullptr) recognised = opened;
+            return opened;
+        };
+        recognised = nullptr;
+        int32_t err = 0;
+        mtsrc_ctx *source = mtsrc_open_mfal(&io, 0, &err);
+        ASSERT_NE(source, nullptr) << err;
+        expect_same(read(source, SIZE_MAX), read_all(fixture(name)));
+        mtsrc_deinit(source);
+    }
+}
+
+// Tags and garbage that bare streams are found in.
+TEST(MpegAudio, PassesTagsAndGarbage) {
+    bytes file = load(fixture("vbr.mp3"));
+    const samples plain = read_all(fixture("vbr_no_table.mp3"));
+    constexpr size_t kTable = 36;  // behind the side information of MPEG-1 stereo; VBRI's place too
+    ASSERT_EQ(memcmp(file.data() + kTable, "Xing", 4), 0);
+    for (const char *name : {"Info", "VBRI"}) {
+        memcpy(file.data() + kTable, name, 4);
+        expect_same(read_all(save("table.mp3", file)), plain);
+    }
+    // An ID3v2.3 tag of 600 bytes that look like frames of another stream.
+    bytes id3v2 = {'I', 'D', '3', 3, 0, 0, 0, 0, 600 >> 7, 600 & 0x7F};
+    while (id3v2.size() < 610) {
+        const size_t i = id3v2.size() % 104;
+        id3v2.push_back(i == 10 ? 0xFF : i == 11 ? 0xFB : 0x10);
+    }
+    bytes ape_end = {'A', 'P', 'E', 'T', 'A', 'G', 'E', 'X', 0xD0, 7, 0, 0, 64 + 32, 0, 0, 0, 1};
+    ape_end.resize(32);
+    bytes id3v1 = {'T', 'A', 'G'};
+    id3v1.resize(128);
+    const bytes behind = joined({bytes(64, 0x20), ape_end, id3v1});
+    expect_same(read_all(save("tags.mp3", joined({id3v2, id3v2, file, behind}))), plain);
+    const bytes aac = load(fixture("golden/plain.aac"));
+    expect_same(read_all(save("tags.aac", joined({id3v2, aac}))),
+                read_all(fixture("golden/plain.aac")));
+    const bytes flac = load(fixture("song.flac"));
+    expect_same(read_all(save("tags.flac", joined({id3v2, flac, id3v1}))),
+                read_all(fixture("song.wav")));
+    // A second Ogg stream chained behind is not read.
+    const bytes ogg = load(fixture("golden/plain.ogg"));
+    expect_same(read_all(save("chained.ogg", joined({ogg, ogg}))),
+                read_all(fixture("golden/plain.ogg")));
+}
+
+// The sound beside a picture is read, and has its own duration.
+TEST(Video, IsNotOpened) {
+    const std::string paths[] = {fixture("video.mp4"), fixture("video.ogv")};
+    mtsrc_io io = io_for(paths[0]);
+    int32_t short_word = 0;
+    xmp4_info mp4 = {};
+    void *file = xmp4fd_create(&io, &short_word, &mp4, nullptr);
+    ASSERT_NE(file, nullptr);
+    EXPECT_EQ(mp4.track_count, 2);
+    EXPECT_EQ(get_mp4_audiostream(&mp4), 1);
+    for (const int32_t index : {-1, 0, 2}) EXPECT_EQ(xmp4fds_open(file, index, nullptr), nullptr);
+    EXPECT_NE(xmp4fds_open(file, 1, nullptr), nullptr);
+    EXPECT_EQ(mp4.duration, opened(fixture("low.aac")).format.duration);
+    xmp4fd_delete(file);
+
+    io = io_for(paths[1]);
+    int64_t word = 0;
+    xogg_info ogg = {};
+    file = xoggd_create(&io, &word, &ogg, nullptr);
+    ASSERT_NE(file, nullptr);
+    EXPECT_EQ(ogg.stream_count, 2);
+    EXPECT_EQ(get_ogg_audiostream(&ogg), 1);
+    for (const int32_t index : {-1, 0, 2}) EXPECT_EQ(xoggds_open(file, index, nullptr), nullptr);
+    EXPECT_NE(xoggds_open(file, 1, nullptr), nullptr);
+    xoggd_delete(file);
+}
+
+// Other codecs, free format, and files that have nothing of a format but its first bytes.
+TEST(Files, ThatCannotBeReadAreRefused) {
+    EXPECT_EQ(opened(fixture("alac.m4a")).error, -3);
+    EXPECT_EQ(opened(fixture("silent.mp4")).error, -7);
+    EXPECT_EQ(opened(fixture("opus.ogg")).error, -7);
+    const char *const heads[] = {"", "RIFF....WAVEfmt ", "fLaC", "....ftyp", "OggS", "ADIF", "ID3"};
+    for (const char *head : heads) {
+        for (const size_t size : {3U, 100U, 100'000U}) {
+            for (const int fill : {0x00, 0x55, 0xFF}) {
+                SCOPED_TRACE(std::string(head) + ", " + std::to_string(size));
+                bytes contents(size, static_cast<uint8_t>(fill));
+                memcpy(contents.data(), head, std::min(size, strlen(head)));
+                EXPECT_EQ(opened(save("noise", contents)).source, nullptr);
+            }
+        }
+    }
+}
+
+}  // namespace
+}  // namespace codec_test

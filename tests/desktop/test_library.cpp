@@ -1,0 +1,185 @@
+// libwexaaudio.so as a library: its decoders called directly, the shared object that it loads, and
+// the scans that its readers share.
+#include <dlfcn.h>
+#include <pthread.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <memory>
+
+#include "tests/desktop/codec_test.h"
+
+namespace codec_test {
+namespace {
+
+namespace fs = std::filesystem;
+
+struct decoder_functions {
+    wexa_config right;  // what the sources ask for
+    void *(*create)(const wexa_config *, void *);
+    int32_t (*decode)(void *, const wexa_frame *, wexa_output *, wexa_status *);
+    void (*remove)(void *);
+};
+
+TEST(Decoder, HandsOutWhatTheReaderDecoded) {
+    const decoder_functions codecs[] = {
+        {{1, 2, 2, 0}, xflacd_create, xflacd_decode, xflacd_delete},
+        {{1, 0, 2, 0}, xmp123d_create, xmp123d_decode, xmp123d_delete},
+        {{1, 1, 2, 0}, xvorbisd_create, xvorbisd_decode, xvorbisd_delete},
+    };
+    for (const decoder_functions &each : codecs) {
+        wexa_config wrong = each.right;
+        wrong.bytes_per_sample = 3;
+        EXPECT_EQ(each.create(&wrong, nullptr), nullptr);
+        EXPECT_EQ(each.create(nullptr, nullptr), nullptr);
+        void *decoder = each.create(&each.right, nullptr);
+        ASSERT_NE(decoder, nullptr);
+        samples pcm = {1, -2, 3, -4};
+        samples out(5, 99);
+        wexa_frame frame = {};
+        frame.data = pcm.data();
+        wexa_output output = {};
+        output.data = out.data();
+        wexa_status status = {};
+        EXPECT_EQ(each.decode(decoder, &frame, &output, &status), 0);
+        EXPECT_EQ(status.produced, 0);  // no bytes
+        frame.bytes = 8;
+        EXPECT_EQ(each.decode(decoder, &frame, &output, &status), 0);
+        EXPECT_NE(status.produced, 0);
+        EXPECT_EQ(output.bytes, 8);
+        EXPECT_EQ(out, (samples{1, -2, 3, -4, 99}));
+        EXPECT_NE(each.decode(nullptr, &frame, &output, &status), 0);
+        frame.data = nullptr;
+        EXPECT_NE(each.decode(decoder, &frame, &output, &status), 0);
+        each.remove(decoder);
+        each.remove(nullptr);
+    }
+    // Set-up data, which comes without a destination, is known by its first byte.
+    void *vorbis = xvorbisd_create(&codecs[2].right, nullptr);
+    uint8_t data[] = {2, 30};
+    wexa_frame frame = {};
+    frame.data = data;
+    frame.bytes = sizeof data;
+    wexa_output output = {};
+    wexa_status status = {};
+    EXPECT_EQ(xvorbisd_decode(vorbis, &frame, &output, &status), 0);
+    EXPECT_EQ(status.produced, 0);
+    data[0] = 1;
+    EXPECT_NE(xvorbisd_decode(vorbis, &frame, &output, &status), 0);
+    xvorbisd_delete(vorbis);
+}
+
+bool has_libavcodec() {
+    std::ifstream maps("/proc/self/maps");
+    for (std::string line; std::getline(maps, line);) {
+        if (line.find("libavcodec") != std::string::npos) return true;
+    }
+    return false;
+}
+
+// WAV and FLAC do without libavcodec; the first four sources that need it open at once. Behind
+// other cases, in a process of its own.
+TEST(Library, LoadsLibavcodecWhenNeeded) {
+    if (has_libavcodec()) {
+        const std::string self = fs::read_symlink("/proc/self/exe");
+        const std::string again = "'" + self + "' --gtest_filter=*LoadsLibavcodec* >/dev/null";
+        EXPECT_EQ(std::system(again.c_str()), 0);
+        return;
+    }
+    for (const char *name : {"song.wav", "song.flac"}) {
+        EXPECT_GT(read_all(fixture(name)).size(), 0U);
+        EXPECT_FALSE(has_libavcodec()) << name;
+    }
+    const char *names[] = {"cbr.mp3", "low.aac", "song.ogg", "first.m4a"};
+    pthread_t threads[4];
+    for (size_t i = 0; i < 4; ++i) {
+        const auto open_and_read = [](void *name) -> void * {
+            return new size_t(read_all(fixture(static_cast<const char *>(name))).size());
+        };
+        ASSERT_EQ(pthread_create(&threads[i], nullptr, open_and_read, const_cast<char *>(names[i])),
+                  0);
+    }
+    for (pthread_t thread : threads) {
+        void *result = nullptr;
+        pthread_join(thread, &result);
+        const std::unique_ptr<size_t> size(static_cast<size_t *>(result));
+        EXPECT_GT(*size, 500'000U);
+    }
+    EXPECT_TRUE(has_libavcodec());
+}
+
+// A copy of the library without the shared object beside it.
+TEST(Library, NamesWhatIsMissing) {
+    Dl_info info = {};
+    ASSERT_NE(dladdr(reinterpret_cast<void *>(xaac_init), &info), 0);
+    const fs::path folder = testing::TempDir() + "tavo_alone_" + std::to_string(getpid());
+    fs::create_directory(folder);
+    const std::string copy = folder / "libwexaaudio.so";
+    fs::copy_file(fs::canonical(info.dli_fname), copy);
+    void *library = dlopen(copy.c_str(), RTLD_NOW | RTLD_LOCAL);
+    fs::remove_all(folder);
+    ASSERT_NE(library, nullptr) << dlerror();
+    testing::internal::CaptureStderr();
+    for (const char *name : {"xaac_init", "xmp123_init", "xvorbis_init"}) {
+        const auto init = reinterpret_cast<int32_t (*)()>(dlsym(library, name));
+        ASSERT_NE(init, nullptr);
+        EXPECT_NE(init(), 0) << name;
+    }
+    const auto flac_init = reinterpret_cast<int32_t (*)()>(dlsym(library, "xflac_init"));
+    EXPECT_EQ(flac_init(), 0);
+    const std::string said = testing::internal::GetCapturedStderr();
+    EXPECT_EQ(said.compare(0, 12, "E/wexaaudio:"), 0) << said;
+    EXPECT_NE(said.find("libwexaaudio_av.so"), std::string::npos) << said;
+    dlclose(library);
+}
+
+int64_t bytes_read;
+
+// The second reader of a file that is open does not scan it again. A file that was replaced is
+// scanned anew, and so is one that comes through other callbacks.
+TEST(Library, SharesTheScanOfAFile) {
+    const std::string path = save("shared.mp3", load(fixture("cbr.mp3")));
+    mtsrc_io io = io_for(path);
+    io.read = [](mtsrc_file *file, void *buf, int32_t count) {
+        const int64_t got = mtsrc_file_read(file, buf, count);
+        bytes_read += std::max<int64_t>(got, 0);
+        return got;
+    };
+    xmp123_info info = {};
+    const auto open = [&] {
+        bytes_read = 0;
+        int64_t word = 0;
+        info = {};
+        void *reader = xmp123fd_create(&io, &word, &info, nullptr);
+        EXPECT_NE(reader, nullptr);
+        return reader;
+    };
+    const auto size = static_cast<int64_t>(load(path).size());
+    void *first = open();
+    EXPECT_GE(bytes_read, size);
+    const int64_t duration = info.duration;
+    void *second = open();
+    EXPECT_EQ(bytes_read, 0);
+    EXPECT_EQ(info.duration, duration);
+    save("shared.mp3", load(fixture("mono.mp3")));
+    void *third = open();
+    EXPECT_GT(bytes_read, 0);
+    EXPECT_EQ(info.duration, opened(fixture("mono.mp3")).format.duration);
+    xmp123fd_delete(first);
+    samples pcm(9600);
+    int32_t got = 0;
+    int64_t unused = 0;
+    EXPECT_EQ(xmp123fd_get_frm(third, pcm.data(), 19200, &got, &unused, &unused), 0);
+    xmp123fd_delete(second);
+    xmp123fd_delete(third);
+    void *again = open();  // nothing is kept behind the last reader
+    EXPECT_GT(bytes_read, 0);
+    xmp123fd_delete(again);
+}
+
+}  // namespace
+}  // namespace codec_test
