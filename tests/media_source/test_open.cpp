@@ -159,17 +159,18 @@ TEST_F(OpenClose, ContainersChooseTheFirstAudioTrack) {
 
 TEST_F(OpenClose, VorbisSetUpDataReachTheDecoder) {
     scripted::script plan;
-    plan.setup = byte_run(40, 9);
+    // Of this length a block of its own pages has at most 8 bytes more, of one byte more a page.
+    constexpr int32_t kLength = (15 << 20) - 24;
+    plan.setup = byte_run(kLength, 9);
     ASSERT_EQ(open_row(source_row_of("ogg"), plan), 0);
-    // A block of 40 bytes holds just 40, one of 41 holds more: not a byte is added.
-    EXPECT_EQ(last_call("xoggds_get_format").number, 40);
+    EXPECT_LE(last_call("xoggds_get_format").number, kLength + 8);
     const scripted::call set_up = last_call("xvorbisd_decode");
     const auto frame = recorded<wexa_frame>(set_up, 0);
-    EXPECT_EQ(frame.bytes, 40);
+    EXPECT_EQ(frame.bytes, kLength);
     EXPECT_EQ(frame.word_20, 0);
     EXPECT_EQ(frame.codec, 323);
     EXPECT_EQ(recorded<wexa_output>(set_up, 1).data, nullptr);
-    EXPECT_EQ(set_up.records[3], plan.setup);
+    EXPECT_TRUE(set_up.records[3] == plan.setup);
     close_source();
     for (const int32_t length : {-1, (1 << 24) + 1}) {
         plan.setup_length = length;
