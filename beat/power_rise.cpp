@@ -11,14 +11,15 @@ namespace {
 
 typedef int32_t int_pair __attribute__((vector_size(8)));
 
-constexpr int64_t kBlock = 5512;               // samples, half a second at 11025 Hz
-constexpr double kUnmeasured = -150.0;         // dB of a block that no sample was measured in
-constexpr int32_t kTopLevel = 32767;           // the level is a 16-bit value and stays there
-constexpr int32_t kLevelFloor = 1000;          // -30.31 dB
-constexpr int32_t kDecay = 1000;               // the held level loses a thousandth per sample
-constexpr int64_t kReach = 5;                  // samples before, and with the sample itself after
-constexpr int64_t kStep = 4;                   // samples measured at a time
-constexpr int64_t kSpan = 2 * kReach + kStep;  // squares around the last ones
+constexpr int64_t kBlock = 5512;        // samples, half a second at 11025 Hz
+constexpr double kUnmeasured = -150.0;  // dB of a block that no sample was measured in
+constexpr int32_t kTopLevel = 32767;    // the level is a 16-bit value and stays there
+constexpr int32_t kLevelFloor = 1000;   // -30.31 dB
+constexpr int32_t kDecay = 1000;        // the held level loses a thousandth per sample
+constexpr int64_t kReach = 5;           // samples before, and with the sample itself after
+constexpr int64_t kChunk = 64;          // samples measured at once; even
+static_assert(kChunk % 2 == 0 && kBlock % 2 == 0 && kReach % 2 == 1);  // no block's count is odd
+constexpr double kNearlyMost = 1.0 - 0x1p-40;  // far more than roundings make of a sum of squares
 constexpr int64_t kLookAhead = 8;              // blocks in the four-second mean
 constexpr int64_t kRiseApart = 7;              // blocks from a rise to the next possible one
 constexpr double kMeanStep = 4.0;              // dB the quiet blocks lie below the mean to come
@@ -26,10 +27,7 @@ constexpr double kLoudMargin = 3.0;            // dB that the loud part may miss
 
 struct block_levels {
     sample_view view;
-    double *db;         // [count + kLookAhead] loudest level of each block, the rest kUnmeasured
-    int32_t *entry;     // [count] the follower's held level before the block's first sample
-    double *squares;    // [kBlock + kSpan] of one block's samples and their neighbours
-    int32_t *measured;  // [kBlock + kStep] what one block's samples measure
+    double *db;  // [count + kLookAhead] loudest level of each block, the rest kUnmeasured
     int64_t count;
 };
 
@@ -45,11 +43,7 @@ double level_db(int32_t level) {
 // Squares of the view's samples from first on.
 void take_squares(sample_view view, int64_t first, int64_t count, double *squares) {
     scale_samples({view.samples + first, view.full_scale}, count, squares);
-    for (int64_t i = 0; i + 1 < count; i += 2) {
-        const double_pair sample = load_pair(squares + i);
-        store_pair(squares + i, sample * sample);
-    }
-    if (count % 2 != 0) squares[count - 1] *= squares[count - 1];
+    for (int64_t i = 0; i < count; ++i) squares[i] *= squares[i];
 }
 
 // Means of ten squares each, for two neighbouring samples, as levels that 16 bits hold. What is not
@@ -62,71 +56,137 @@ int_pair mean_levels(double_pair sum) {
     return __builtin_convertvector(number < top ? number : top, int_pair);
 }
 
-// measured[j] from the ten squares from j on, which are added in their order; kStep at a time, the
-// last ones beyond count.
-void measure_samples(const double *squares, int64_t count, int32_t *measured) {
-    for (int64_t j = 0; j < count; j += kStep) {
-        const auto two = [=](int64_t k) { return load_pair(squares + j + k); };
-        const double_pair low =
-            two(0) + two(1) + two(2) + two(3) + two(4) + two(5) + two(6) + two(7) + two(8) + two(9);
-        const double_pair high = two(2) + two(3) + two(4) + two(5) + two(6) + two(7) + two(8) +
-                                 two(9) + two(10) + two(11);
-        const int_pair levels[] = {mean_levels(low), mean_levels(high)};
-        memcpy(measured + j, levels, sizeof levels);
+// What the samples from first on measure, at most kChunk of them: the mean power of the ten around
+// each. Two side by side; the ten squares are added in their order.
+void measure_chunk(sample_view view, int64_t first, int64_t count, int32_t *measured) {
+    double squares[kChunk + 2 * kReach] = {};
+    take_squares(view, first - kReach, count + 2 * kReach - 1, squares);
+    for (int64_t j = 0; j < count; j += 2) {
+        const auto two = [&](int64_t k) { return load_pair(squares + j + k); };
+        const int_pair levels = mean_levels(two(0) + two(1) + two(2) + two(3) + two(4) + two(5) +
+                                            two(6) + two(7) + two(8) + two(9));
+        memcpy(measured + j, &levels, sizeof levels);
     }
 }
 
-// Measures the samples from first to the end of block b. Returns how many.
-int64_t measure_block(const block_levels *blocks, int64_t first, int64_t b) {
-    const int64_t count = b * kBlock - first + 1;
-    take_squares(blocks->view, first - kReach, count + 2 * kReach - 1, blocks->squares);
-    measure_samples(blocks->squares, count, blocks->measured);
-    return count;
+// About the largest sum of the ten squares around the samples from first on, an even count of them,
+// without their scale: within a few units in the last place of what measure_chunk adds. Infinite or
+// NaN when a sum is.
+double chunk_power(sample_view view, int64_t first, int64_t count) {
+    const double *x = view.samples + (first - kReach);
+    const auto two_squares = [=](int64_t j) {
+        const double_pair a = load_pair(x + j);
+        const double_pair b = load_pair(x + j + 1);
+        return a * a + b * b;
+    };
+    // sums of four squares from j on: four[0] at j, four[1] at j + 2, four[2] at j + 4
+    double_pair last = two_squares(6);
+    double_pair four[3] = {two_squares(0) + two_squares(2), two_squares(2) + two_squares(4),
+                           two_squares(4) + last};
+    double_pair most = {0.0, 0.0};
+    double_pair total = {0.0, 0.0};
+    for (int64_t j = 0; j < count; j += 2) {
+        const double_pair next = two_squares(j + 8);
+        const double_pair ten = four[0] + four[2] + next;
+        most = ten > most ? ten : most;
+        total += ten;
+        four[0] = four[1];
+        four[1] = four[2];
+        four[2] = last + next;
+        last = next;
+    }
+    const double sum = total[0] + total[1];
+    return std::isfinite(sum) ? std::max(most[0], most[1]) : sum;
+}
+
+// The largest that the samples from first to last measure. Only where the sum of squares comes near
+// the largest one is it taken exactly.
+int32_t measure_block(sample_view view, int64_t first, int64_t last) {
+    double power[kBlock / kChunk + 1];
+    double most = 0.0;
+    int64_t chunks = 0;
+    for (int64_t i = first; i <= last; i += kChunk, ++chunks) {
+        power[chunks] = chunk_power(view, i, std::min(kChunk, last - i + 1));
+        most = std::max(most, power[chunks]);
+    }
+
+    int32_t largest = 0;
+    int32_t measured[kChunk];
+    for (int64_t c = 0; c < chunks; ++c) {
+        if (power[c] < most * kNearlyMost) continue;  // never true of NaN
+        const int64_t begin = first + c * kChunk;
+        const int64_t count = std::min(kChunk, last - begin + 1);
+        measure_chunk(view, begin, count, measured);
+        largest = std::max(largest, *std::max_element(measured, measured + count));
+    }
+    return largest;
 }
 
 // The level of a sample: what it measures, or what an earlier peak has decayed to. held is carried
 // from sample to sample.
 int32_t follow_level(int32_t measured, int32_t *held) {
-    const int32_t level = measured >= *held ? measured : *held;
+    const int32_t level = std::max(measured, *held);
     *held = level - level / kDecay;
     return level;
 }
 
-// Block b is measured over the samples (b - 1) * kBlock + 1 to b * kBlock, from kReach on. The
-// decibels of the largest level are the largest decibels, so one logarithm a block is enough.
-void measure_blocks(int64_t n, block_levels *blocks) {
-    int32_t held = 0;
-    int64_t first = kReach;
-    for (int64_t b = 1; b < blocks->count && b * kBlock <= n - kReach; ++b) {
-        blocks->entry[b] = held;
-        const int64_t count = measure_block(blocks, first, b);
-        int32_t loudest = 0;
-        for (int64_t i = 0; i < count; ++i) {
-            const int32_t level = follow_level(blocks->measured[i], &held);
-            if (level > loudest) loudest = level;
-        }
-        blocks->db[b] = level_db(loudest);
-        first = b * kBlock + 1;
-    }
+// Samples after which even the largest level has decayed below the floor: what is held from before
+// them makes no difference.
+constexpr int64_t samples_to_forget() {
+    int64_t count = 0;
+    for (int32_t level = kTopLevel; level >= kLevelFloor; level -= level / kDecay) ++count;
+    return count;
+}
+static_assert(samples_to_forget() < kBlock - kReach);
+
+int64_t first_sample(int64_t b) {
+    return b == 1 ? kReach : (b - 1) * kBlock + 1;
 }
 
-// First sample among (b - 1) * kBlock to b * kBlock whose decibels reach target, or -1. The two
-// boundary samples carry the maxima of their blocks; between them the levels are followed again
-// from the block's entry, which spares an array of n of them.
+// The level held after block b, as its last samples, reach of them, leave it.
+int32_t held_after(sample_view view, int64_t b, int64_t reach) {
+    int32_t held = 0;
+    int32_t measured[kChunk];
+    const int64_t end = b * kBlock + 1;
+    for (int64_t i = std::max(end - reach, first_sample(b)); b > 0 && i < end; i += kChunk) {
+        const int64_t count = std::min(kChunk, end - i);
+        measure_chunk(view, i, count, measured);
+        for (int64_t k = 0; k < count; ++k) follow_level(measured[k], &held);
+    }
+    return held;
+}
+
+// Samples after which a level up to largest has decayed to level, or to the floor if that is
+// higher.
+int64_t samples_to_decay(int32_t largest, int32_t level) {
+    const int32_t bottom = std::max(level, kLevelFloor - 1);
+    const int32_t step =
+        std::max((bottom + 1) / kDecay, 1);  // the least that any sample takes away
+    return largest > bottom ? (largest - bottom + step - 1) / step : 0;
+}
+
+// First sample among (b - 1) * kBlock to b * kBlock, b at least 2, whose decibels reach target, or
+// -1. The two boundary samples carry the maxima of their blocks; between them the levels are
+// followed one by one.
 int64_t find_sample(const block_levels *blocks, int64_t b, double target) {
     const int64_t start = (b - 1) * kBlock;
+    const int64_t end = start + kBlock;
     if (blocks->db[b - 1] >= target) return start;
 
-    int32_t held = blocks->entry[b];
+    int32_t held = held_after(blocks->view, b - 1, samples_to_forget());
     int32_t loudest = -1;
-    measure_block(blocks, start + 1, b);
-    for (int64_t i = 1; i < kBlock; ++i) {
-        const int32_t level = follow_level(blocks->measured[i - 1], &held);
-        if (level <= loudest) continue;  // no louder than one that did not reach the target
-        loudest = level;
-        if (level_db(level) >= target) return start + i;
+    int32_t measured[kChunk];
+    for (int64_t i = start + 1; i < end; i += kChunk) {
+        const int64_t count = std::min(kChunk, end - i);
+        measure_chunk(blocks->view, i, count, measured);
+        for (int64_t k = 0; k < count; ++k) {
+            const int32_t level = follow_level(measured[k], &held);
+            if (level <= loudest) continue;  // no louder than one that did not reach the target
+            loudest = level;
+            if (level_db(level) >= target) return i + k;
+        }
     }
-    return blocks->db[b] >= target ? start + kBlock : -1;
+    return blocks->db[b] >= target ? end : -1;
 }
 
 double mean_ahead(const double *db) {
@@ -170,22 +230,6 @@ rise_limits take_limits(const block_levels *blocks, double *sorted) {
     return {p60, (p60 + p40) * 0.5};
 }
 
-bool obtain_levels(block_levels *blocks) {
-    blocks->db = zeroed_items<double>(blocks->count + kLookAhead);
-    blocks->entry = zeroed_items<int32_t>(blocks->count);
-    blocks->squares = zeroed_items<double>(kBlock + kSpan);
-    blocks->measured = zeroed_items<int32_t>(kBlock + kStep);
-    return blocks->db != nullptr && blocks->entry != nullptr && blocks->squares != nullptr &&
-           blocks->measured != nullptr;
-}
-
-void release_levels(block_levels *blocks) {
-    free(blocks->db);
-    free(blocks->entry);
-    free(blocks->squares);
-    free(blocks->measured);
-}
-
 }  // namespace
 
 int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n) {
@@ -203,16 +247,31 @@ int32_t find_power_rises(sample_view view, int64_t n, int64_t **samples) {
     blocks.count = n / kBlock + 1;
     if (blocks.count < 3) return 0;
 
+    blocks.db = zeroed_items<double>(blocks.count + kLookAhead);
     double *sorted = zeroed_items<double>(blocks.count);
     *samples = zeroed_items<int64_t>(blocks.count / kRiseApart + 1);
     int32_t count = TAVO_ERR_MEMORY;
-    if (obtain_levels(&blocks) && sorted != nullptr && *samples != nullptr) {
-        std::fill_n(blocks.db, blocks.count + kLookAhead, kUnmeasured);
-        measure_blocks(n, &blocks);
+    if (blocks.db != nullptr && sorted != nullptr && *samples != nullptr) {
+        std::fill_n(blocks.db + blocks.count, kLookAhead, kUnmeasured);
+        measure_block_levels(view, n, blocks.db);
         const rise_limits limits = take_limits(&blocks, sorted);
         count = locate_rises(&blocks, &limits, *samples);
     }
+    free(blocks.db);
     free(sorted);
-    release_levels(&blocks);
     return count;
+}
+
+// Block b is measured over the samples (b - 1) * kBlock + 1 to b * kBlock, from kReach on. The
+// decibels of the largest level are the largest decibels, so one logarithm a block is enough; and
+// the largest level is the largest measured, or what is held from the block before.
+void measure_block_levels(sample_view view, int64_t n, double *db) {
+    std::fill_n(db, n / kBlock + 1, kUnmeasured);
+    int32_t largest_before = 0;
+    for (int64_t b = 1; b * kBlock <= n - kReach; ++b) {
+        const int32_t largest = measure_block(view, first_sample(b), b * kBlock);
+        const int64_t reach = samples_to_decay(largest_before, largest);
+        db[b] = level_db(std::max(largest, held_after(view, b - 1, reach)));
+        largest_before = largest;
+    }
 }
