@@ -1,6 +1,7 @@
 #include "cli/analyse.h"
 
 #include <poll.h>
+#include <sys/resource.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -99,15 +100,15 @@ void analyse_opened(const library_path &opened, const options &opts, int stop_fd
     run_job(ctx, opts, stop_fd, out);
 }
 
-}  // namespace
-
-record failed_record(const std::string &file, int32_t mode, const std::string &error) {
-    record made;
-    made.file = file;
-    made.mode = mode;
-    made.error = error;
-    return made;
+// Of this process, all threads: user and system.
+int64_t cpu_time_ms() {
+    rusage used{};
+    getrusage(RUSAGE_SELF, &used);
+    const auto ms = [](const timeval &time) { return 1000 * time.tv_sec + time.tv_usec / 1000; };
+    return ms(used.ru_utime) + ms(used.ru_stime);
 }
+
+}  // namespace
 
 record analyse(const std::string &path, const options &opts, int stop_fd) {
     record out = failed_record(path, opts.mode, explain_before_open(path));
@@ -119,7 +120,9 @@ record analyse(const std::string &path, const options &opts, int stop_fd) {
     if (!out.error.empty()) return out;
 
     library_path opened = open_library_path(path);
+    const int64_t before_ms = cpu_time_ms();
     analyse_opened(opened, opts, stop_fd, out);
+    out.cpu_ms = cpu_time_ms() - before_ms;
     close_library_path(opened);
     const std::string error = finish_click(click, out.status == outcome::ok);
     if (!error.empty()) {

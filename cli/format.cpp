@@ -1,5 +1,7 @@
 #include "cli/format.h"
 
+#include "cli/names.h"
+
 std::string format_head(result_format format) {
     return format == result_format::csv ? csv_head() : "";
 }
@@ -12,8 +14,7 @@ std::string format_record(result_format format, const record &result) {
             return json_record(result);
         case result_format::csv:
             return csv_record(result);
-        case result_format::labels:
-            return labels_record(result);
+        default:  // marker files: the name of the file written
+            return result.written.empty() ? "" : shown(result.written) + "\n";
     }
-    return "";
 }

@@ -1,4 +1,4 @@
-// A record as text in one of the formats, ready for standard output.
+// A record as text for standard output, in one of the formats.
 #ifndef TAVO_CLI_FORMAT_H
 #define TAVO_CLI_FORMAT_H
 
@@ -17,10 +17,5 @@ std::string text_record(const record &result);
 std::string json_record(const record &result);
 std::string csv_head();
 std::string csv_record(const record &result);
-
-// The label track's content, its path for an input, and the line that names it.
-std::string label_track(const record &result);
-std::string label_path(const std::string &input, const std::string &output_dir);
-std::string labels_record(const record &result);
 
 #endif

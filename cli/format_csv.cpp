@@ -1,3 +1,5 @@
+#include <cmath>
+
 #include "cli/format.h"
 #include "cli/words.h"
 
@@ -23,8 +25,8 @@ std::string spaced(const std::vector<float> &times) {
 }  // namespace
 
 std::string csv_head() {
-    return "file,mode,status,sample_rate,channels,duration_ms,hl_pos_ms,bpm,beat_count,beats_ms,"
-           "error\n";
+    return "file,mode,status,sample_rate,channels,duration_ms,hl_pos_ms,hl_end_ms,hl_refined,bpm,"
+           "beat_count,beats_ms,cpu_ms,error\n";
 }
 
 std::string csv_record(const record &result) {
@@ -37,9 +39,14 @@ std::string csv_record(const record &result) {
     row += "," + when(result.has_stream, result.channels);
     row += "," + when(result.has_stream, result.duration_ms);
     row += "," + when(result.has_highlight, result.hl_pos_ms);
+    row += "," + when(result.has_highlight && result.length_s > 0,
+                      std::llround(highlight_end_ms(result, result.length_s)));
+    row += ",";
+    if (has_refinement(result)) row += is_refined(result) ? "true" : "false";
     row += "," + when(result.has_beats, result.bpm);
     row += "," + when(result.has_beats, static_cast<int64_t>(result.beats_ms.size()));
     row += "," + spaced(result.beats_ms);
+    row += "," + when(result.cpu_ms >= 0, result.cpu_ms);
     row += "," + cell(result.error);
     return row + "\n";
 }

@@ -1,3 +1,4 @@
+#include <cmath>
 #include <nlohmann/json.hpp>
 
 #include "cli/format.h"
@@ -25,12 +26,19 @@ std::string json_record(const record &result) {
         object["channels"] = result.channels;
         object["duration_ms"] = result.duration_ms;
     }
-    if (result.has_highlight) object["hl_pos_ms"] = result.hl_pos_ms;
+    if (result.has_highlight) {
+        object["hl_pos_ms"] = result.hl_pos_ms;
+        if (result.length_s > 0) {
+            object["hl_end_ms"] = std::llround(highlight_end_ms(result, result.length_s));
+        }
+        if (has_refinement(result)) object["hl_refined"] = is_refined(result);
+    }
     if (result.has_beats) {
         object["bpm"] = result.bpm;
         object["beat_count"] = result.beats_ms.size();
         object["beats_ms"] = result.beats_ms;
     }
+    if (result.cpu_ms >= 0) object["cpu_ms"] = result.cpu_ms;
     if (!result.error.empty()) object["error"] = as_utf8(result.error);
     return object.dump() + "\n";
 }

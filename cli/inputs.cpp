@@ -1,16 +1,13 @@
 #include "cli/inputs.h"
 
 #include <dirent.h>
-#include <fcntl.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <cstdio>
-#include <map>
+#include <functional>
 
-#include "cli/format.h"
+#include "cli/markers.h"
 #include "cli/names.h"
 #include "cli/recognise.h"
 #include "cli/words.h"
@@ -18,142 +15,191 @@
 
 namespace {
 
-constexpr size_t kReadBytes = 65'536;
-
-struct search {
-    const options &from;
-    bool (*stop_requested)();
-    std::vector<input> found;
-};
-
 std::string joined(const std::string &folder, const std::string &name) {
     return folder.back() == '/' ? folder + name : folder + "/" + name;
 }
 
+void add_note(input_supply &supply, const std::string &sentence) {
+    supply.notes += "tavo: " + sentence + "\n";
+}
+
+uint64_t hash_of(uint64_t device, uint64_t inode, const std::string &name) {
+    return std::hash<std::string>()(std::to_string(device) + "/" + std::to_string(inode) + "/" +
+                                    name);
+}
+
+// Decides about an input whose format writes a file. False leaves it out.
+bool claim_target(input_supply &supply, input &entry) {
+    const std::string target = marker_path(entry.path, supply.opts);
+    const std::string name = base_name(target);
+    struct stat info {};
+    if (supply.opts.skip_existing && lstat(target.c_str(), &info) == 0) {
+        ++supply.existing;
+        return false;
+    }
+    if (stat((target.substr(0, target.size() - name.size()) + ".").c_str(), &info) != 0) {
+        return true;  // writing will tell
+    }
+    const uint64_t target_hash = hash_of(info.st_dev, info.st_ino, name);
+    if (stat(entry.path.c_str(), &info) != 0) return true;
+    const uint64_t input_hash = hash_of(info.st_dev, info.st_ino, "");
+    const auto [claim, first] = supply.targets.emplace(target_hash, input_hash);
+    if (first) return true;
+    if (claim->second == input_hash) {
+        add_note(supply, shown(entry.path) + ": named more than once, done once.");
+        return false;
+    }
+    entry.error = "Its file " + shown(target) +
+                  " would replace that of another input, whose name is the same.";
+    return true;
+}
+
 // The entries' names in the order of their bytes. Returns 0 or errno.
-int list_folder(const std::string &path, std::vector<std::string> &names) {
-    DIR *folder = opendir(path.c_str());
-    if (folder == nullptr) return errno;
+int list_folder(open_folder &folder) {
+    DIR *stream = opendir(folder.path.c_str());
+    if (stream == nullptr) return errno;
     errno = 0;
-    while (const dirent *entry = readdir(folder)) {
+    while (const dirent *entry = readdir(stream)) {
         const std::string name = entry->d_name;
-        if (name != "." && name != "..") names.push_back(name);
+        if (name != "." && name != "..") folder.names.push_back(name);
     }
     const int code = errno;
-    closedir(folder);
-    std::sort(names.begin(), names.end());
+    closedir(stream);
+    std::sort(folder.names.begin(), folder.names.end());
     return code;
 }
 
-void add_if_audio(search &walk, const std::string &path) {
-    int32_t type = 0;
-    const int code = recognise(path, type);
-    if (code == EACCES || code == EPERM || code == EIO) {
-        walk.found.push_back({path, system_sentence("The file cannot be read", code)});
-    } else if (code == 0 && type != kMtsrcTypeUnknown) {
-        walk.found.push_back({path, ""});
+// Begins to search a folder, unless a link has led back to one that is being searched.
+// True when there is an input to hand out instead.
+bool enter_folder(input_supply &supply, const std::string &path, const struct stat &info,
+                  input &out) {
+    open_folder folder;
+    folder.path = path;
+    folder.id[0] = info.st_dev;
+    folder.id[1] = info.st_ino;
+    for (const open_folder &outer : supply.folders) {
+        if (std::equal(outer.id, outer.id + 2, folder.id)) return false;
     }
-}
-
-void add_folder(search &walk, const std::string &path, bool inner) {
-    std::vector<std::string> names;
-    const int code = list_folder(path, names);
+    const int code = list_folder(folder);
     if (code != 0) {
-        walk.found.push_back({path, system_sentence("The folder cannot be read", code)});
-        return;
+        out = {path, system_sentence("The folder cannot be read", code)};
+        ++supply.found;
+        return true;
     }
-    const size_t before = walk.found.size();
-    for (const std::string &name : names) {
-        if (walk.stop_requested()) return;
-        const std::string entry = joined(path, name);
-        struct stat info {};
-        if (lstat(entry.c_str(), &info) != 0) continue;
-        if (S_ISDIR(info.st_mode)) {
-            if (walk.from.recursive) add_folder(walk, entry, true);
-            continue;
-        }
-        if (S_ISLNK(info.st_mode) && stat(entry.c_str(), &info) != 0) continue;
-        if (S_ISREG(info.st_mode)) add_if_audio(walk, entry);
-    }
-    if (!inner && walk.found.size() == before) {
-        walk.found.push_back(
-            {path, "The folder holds no audio files" +
-                       std::string(walk.from.recursive
-                                       ? "."
-                                       : " itself; --recursive searches the folders in it.")});
-    }
+    if (supply.folders.empty()) supply.found = supply.skipped = 0;
+    supply.folders.push_back(std::move(folder));
+    return false;
 }
 
-void add_path(search &walk, const std::string &path) {
+// The innermost folder holds no more. True for an input that says that there was no audio.
+bool leave_folder(input_supply &supply, input &out) {
+    const std::string path = supply.folders.back().path;
+    supply.folders.pop_back();
+    if (!supply.folders.empty()) return false;
+    if (supply.found == 0) {
+        out = {path, "The folder holds no audio files" +
+                         std::string(supply.opts.recursive
+                                         ? "."
+                                         : " itself; --recursive searches the folders in it.")};
+        return true;
+    }
+    if (supply.skipped > 0) {
+        add_note(supply, shown(path) + ": " + count_text(supply.skipped, "file") +
+                             " left out, not recognised as audio.");
+    }
+    return false;
+}
+
+bool take_entry(input_supply &supply, input &out) {
+    open_folder &folder = supply.folders.back();
+    if (folder.next == folder.names.size()) return leave_folder(supply, out);
+    const std::string path = joined(folder.path, folder.names[folder.next++]);
+    struct stat info {};
+    if (stat(path.c_str(), &info) != 0) return false;
+    if (S_ISDIR(info.st_mode)) {
+        return supply.opts.recursive && enter_folder(supply, path, info, out);
+    }
+    if (!S_ISREG(info.st_mode)) return false;
+    int32_t type = kMtsrcTypeUnknown;
+    const int code = recognise(path, type);
+    const bool unreadable = code == EACCES || code == EPERM || code == EIO;
+    const bool audio = code == 0 && type != kMtsrcTypeUnknown;
+    if (!unreadable && !audio) {
+        ++supply.skipped;
+        return false;
+    }
+    ++supply.found;
+    out = {path, unreadable ? system_sentence("The file cannot be read", code) : ""};
+    return true;
+}
+
+bool take_path(input_supply &supply, const std::string &path, input &out) {
     struct stat info {};
     if (stat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) {
-        add_folder(walk, path, false);
-    } else {
-        walk.found.push_back({path, ""});
+        return enter_folder(supply, path, info, out);
     }
+    out = {path, ""};
+    return true;
 }
 
-void add_names(search &walk, const std::string &text) {
-    size_t from = 0;
-    while (from < text.size() && !walk.stop_requested()) {
-        const size_t end = std::min(text.find(walk.from.list_separator, from), text.size());
-        if (end > from) add_path(walk, text.substr(from, end - from));
-        from = end + 1;
+// True for an input; waiting is set when the list has no more for now.
+bool take_from_list(input_supply &supply, input &out, bool &waiting) {
+    std::string name;
+    std::string error;
+    const list_state state = next_name(supply.list, supply.opts.list_separator, name, error);
+    if (state == list_state::name) return take_path(supply, name, out);
+    waiting = state == list_state::waiting;
+    if (waiting) return false;
+    close_list(supply.list);
+    if (state == list_state::ended && supply.list.names == 0) {
+        add_note(supply, list_text(supply.list) + " names no files.");
     }
+    out = {supply.list.name, error};
+    return state == list_state::failed;
 }
 
-void add_list(search &walk, const std::string &list) {
-    const bool standard_input = list == "-";
-    const int fd = standard_input ? STDIN_FILENO : open(list.c_str(), O_RDONLY | O_CLOEXEC);
-    int code = fd < 0 ? errno : 0;
-    std::string text;
-    std::vector<char> part(kReadBytes);
-    while (code == 0 && !walk.stop_requested()) {
-        const ssize_t got = read(fd, part.data(), part.size());
-        if (got > 0) text.append(part.data(), static_cast<size_t>(got));
-        if (got == 0) break;
-        if (got < 0 && errno != EINTR) code = errno;
-    }
-    if (fd >= 0 && !standard_input) close(fd);
-    if (code != 0) {
-        walk.found.push_back({list, system_sentence("The list of files cannot be read", code)});
-        return;
-    }
-    if (text.find_first_not_of(walk.from.list_separator) == std::string::npos && !walk.from.quiet) {
-        fprintf(stderr, "tavo: the list %s names no files.\n",
-                standard_input ? "on standard input" : shown(list).c_str());
-    }
-    add_names(walk, text);
+bool take_argument(input_supply &supply, input &out) {
+    const options &opts = supply.opts;
+    const size_t index = supply.argument++;
+    const bool listed = index >= opts.inputs.size();
+    const std::string &word = listed ? opts.lists[index - opts.inputs.size()] : opts.inputs[index];
+    if (!listed && word != "-") return take_path(supply, word, out);
+    const int code = open_list(supply.list, word);
+    if (code == 0) return false;
+    out = {word, system_sentence("The list of files cannot be read", code)};
+    return true;
 }
 
-// Songs of the same name in different folders meet in one output folder. Which of them is written
-// must not depend on which is analysed first.
-void refuse_shared_tracks(search &walk) {
-    if (walk.from.format != result_format::labels) return;
-    std::map<std::string, std::string> owners;  // track to input
-    for (input &entry : walk.found) {
-        if (!entry.error.empty()) continue;
-        const auto [owner, first] =
-            owners.emplace(label_path(entry.path, walk.from.output_dir), entry.path);
-        if (!first) {
-            entry.error = "Its label track would replace that of " + shown(owner->second) +
-                          ": the names are the same.";
-        }
-    }
+// True for an input.
+bool take_next(input_supply &supply, input &out, bool &waiting) {
+    if (!supply.folders.empty()) return take_entry(supply, out);
+    if (supply.list.fd >= 0) return take_from_list(supply, out, waiting);
+    return take_argument(supply, out);
+}
+
+bool is_done(const input_supply &supply) {
+    return supply.folders.empty() && supply.list.fd < 0 &&
+           supply.argument == supply.opts.inputs.size() + supply.opts.lists.size();
 }
 
 }  // namespace
 
-std::vector<input> expand_inputs(const options &from, bool (*stop_requested)()) {
-    search walk{from, stop_requested, {}};
-    for (const std::string &path : from.inputs) {
-        if (path == "-") {
-            add_list(walk, path);
-        } else {
-            add_path(walk, path);
+supply_state next_input(input_supply &supply, input &out) {
+    bool waiting = false;
+    while (!is_done(supply) && !waiting) {
+        if (!take_next(supply, out, waiting)) continue;
+        if (!out.error.empty() || !writes_files(supply.opts.format) || claim_target(supply, out)) {
+            return supply_state::ready;
         }
     }
-    for (const std::string &list : from.lists) add_list(walk, list);
-    refuse_shared_tracks(walk);
-    return walk.found;
+    if (waiting) return supply_state::waiting;
+    if (supply.existing > 0) {
+        add_note(supply, count_text(supply.existing, "input") + " left out: the file is there.");
+        supply.existing = 0;
+    }
+    return supply_state::ended;
+}
+
+int supply_fd(const input_supply &supply) {
+    return supply.list.fd;
 }

@@ -5,7 +5,6 @@
 #include <cstdio>
 #include <exception>
 
-#include "cli/inputs.h"
 #include "cli/options.h"
 #include "cli/stop.h"
 #include "cli/workers.h"
@@ -28,8 +27,7 @@ int run(int argc, char **argv) {
         perror("tavo");
         return kExitFailed;
     }
-    const std::vector<input> inputs = expand_inputs(opts, stop_requested);
-    return run_workers(opts, inputs);
+    return run_workers(opts);
 }
 
 }  // namespace

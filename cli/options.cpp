@@ -3,8 +3,12 @@
 #include <sys/stat.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
+#include <charconv>
 #include <cstdio>
+#include <iostream>
 
+#include "cli/markers.h"
 #include "core/tavo.h"
 
 namespace {
@@ -14,13 +18,17 @@ constexpr int32_t kMostSeconds = 86'400;  // a day: beyond any song, far below w
 constexpr int32_t kMostBeats = 1'000'000'000;
 
 constexpr const char *kAbout =
-    "Finds the highlight of songs (where the strongest loud passage starts), their tempo and\n"
-    "their beats.";
+    "Finds the highlight of songs (where the strongest sustained loud passage starts), their\n"
+    "tempo and their beats.";
 
 constexpr const char *kFooter =
-    "A folder stands for the audio files in it, told by their content. A list names files or\n"
-    "folders, one a line; '-' as FILE is a list on standard input, read to its end first.\n"
-    "Results go to standard output in the order of the inputs, messages to standard error.\n"
+    "A folder is searched for audio files, recognised by content rather than by name. A list\n"
+    "has one name a line (M3U playlists will do) and is read as it comes. Results go to\n"
+    "standard output in the order of the inputs, messages to standard error.\n"
+    "\n"
+    "The start of a highlight is exact to 0.4 s where the loud passage is louder than about\n"
+    "-14 dBFS RMS; elsewhere it is a point of a 2 s grid, usually 2 to 6 s early, and the text\n"
+    "says \"about\". In mode both the tempo is that of the music from the highlight on.\n"
     "\n"
     "Exit status: 0 all done; 1 a file failed; 2 wrong usage; 130 stopped with Ctrl-C.\n"
     "\n"
@@ -30,13 +38,13 @@ constexpr const char *kFooter =
     "  find . -name '*.flac' -print0 | tavo -0 --format csv -\n"
     "  tavo --format labels --length 30 song.wav   song.wav.labels.txt, for Audacity\n";
 
-int wrong_usage(const std::string &why) {
-    fprintf(stderr, "tavo: %s\nTry 'tavo --help'.\n", why.c_str());
+int wrong_usage(const std::string &sentence) {
+    fprintf(stderr, "tavo: %s\nTry 'tavo --help'.\n", sentence.c_str());
     return kExitUsage;
 }
 
-// What the parser holds as words until they are known to be right.
-struct words {
+// Values that the parser takes as words.
+struct raw_values {
     std::string mode = "both";
     std::string format = "text";
     bool null_separated = false;
@@ -60,40 +68,58 @@ void unshield(std::string &argument) {
     if (argument.size() > 1 && argument[0] == kShield && argument[1] == '[') argument.erase(0, 1);
 }
 
-void declare_analysis(CLI::App &app, options &out, words &read) {
+CLI::Validator whole(int32_t least, int32_t most, const char *unit) {
+    return CLI::Validator(
+        [=](const std::string &text) {
+            int32_t value = 0;
+            const auto end = std::from_chars(text.data(), text.data() + text.size(), value);
+            const bool read = end.ec == std::errc() && end.ptr == text.data() + text.size();
+            if (read && value >= least && value <= most) return std::string();
+            return "'" + text + "' is not a whole number" + unit + " from " +
+                   std::to_string(least) + " to " + std::to_string(most);
+        },
+        "");
+}
+
+void declare_analysis(CLI::App &app, options &out, raw_values &raw) {
     app.add_option(
-           "-m,--mode", read.mode,
+           "-m,--mode", raw.mode,
            "highlight, beats, or both (default):\nthe highlight, then the beats from there on")
         ->check(CLI::IsMember({"highlight", "beats", "both"}).description(""))
         ->type_name("MODE");
-    app.add_option("-l,--length", out.length_s,
-                   "Length of the highlight wanted: its start is placed\nso that a passage of this "
-                   "length ends well")
-        ->check(CLI::Range(0, kMostSeconds).description(""))
+    app.add_option(
+           "-l,--length", out.length_s,
+           "Length of the highlight wanted: the start is placed\nso that a passage of this length "
+           "ends at a boundary of the music")
+        ->check(whole(0, kMostSeconds, " of seconds"))
         ->type_name("SECONDS");
-    app.add_option("--max-beats", out.max_beats, "Most beats that the threshold selects")
-        ->check(CLI::Range(0, kMostBeats).description(""))
+    app.add_option("--max-beats", out.max_beats, "Maximum number of threshold-selected beats")
+        ->check(whole(0, kMostBeats, ""))
         ->type_name("N");
     app.add_option("-j,--jobs", out.jobs,
-                   "Files analysed at once, each in a process of its own;\n1 unless told otherwise")
-        ->check(CLI::Range(1, kMostJobs).description(""))
+                   "Files analysed at once, each in a process of its own;\n1 by default")
+        ->check(whole(1, kMostJobs, ""))
         ->type_name("N");
 }
 
-void declare_output(CLI::App &app, options &out, words &read) {
-    app.add_option("-f,--format", read.format,
-                   "text (default) for people, json: one object a line,\ncsv: one row a file, "
-                   "labels: a label track for Audacity,\nFILE.labels.txt; it marks 30 s of "
-                   "highlight without --length")
+void declare_output(CLI::App &app, options &out, raw_values &raw) {
+    app.add_option(
+           "-f,--format", raw.format,
+           "text (default) for people, json: one object a line,\ncsv: one row a file; or a file of "
+           "markers for each input:\nlabels for Audacity, FILE.labels.txt. Markers span 30 s of\n"
+           "highlight without --length")
         ->check(CLI::IsMember({"text", "json", "csv", "labels"}).description(""))
         ->type_name("FORMAT");
     app.add_option("-o,--output-dir", out.output_dir,
-                   "Folder for the label tracks, else beside each file")
+                   "Folder for the marker files; by default they are\nwritten beside each file")
         ->type_name("DIR");
     app.add_flag("--force", out.force,
-                 "Overwrite label tracks, click tracks and pictures\nthat exist");
+                 "Overwrite marker files, click tracks and pictures\nthat exist");
+    app.add_flag("--skip-existing", out.skip_existing, "Leave out inputs whose marker file exists");
     app.add_option("--click", out.click,
-                   "Write the sound with a click on every beat, a WAV file;\none input only")
+                   "Write the analysed sound with a click on every beat, a\nWAV file; from the "
+                   "highlight on in "
+                   "mode both; one input only")
         ->type_name("WAV");
     app.add_option("--plot", out.plot,
                    "Draw the result, an SVG file: waveform, loudness,\nhighlight and beats; one "
@@ -102,14 +128,16 @@ void declare_output(CLI::App &app, options &out, words &read) {
     app.add_flag("-q,--quiet", out.quiet, "No progress bar and no notes");
 }
 
-void declare_inputs(CLI::App &app, options &out, words &read) {
+void declare_inputs(CLI::App &app, options &out, raw_values &raw) {
     app.add_option("FILE", out.inputs, "Audio files, folders, or '-': a list on standard input")
         ->type_name("");
-    app.add_flag("-r,--recursive", out.recursive, "Search folders in folders too");
+    app.add_flag("-r,--recursive", out.recursive,
+                 "Search folders inside folders too, linked ones included");
     app.add_option("--files-from", out.lists, "A list of files; '-' is standard input")
         ->allow_extra_args(false)
         ->type_name("LIST");
-    app.add_flag("-0,--null", read.null_separated, "Names in lists end with a NUL, not a newline");
+    app.add_flag("-0,--null", raw.null_separated,
+                 "Names in lists end with a NUL instead of a newline");
 }
 
 bool is_folder(const std::string &path) {
@@ -117,35 +145,44 @@ bool is_folder(const std::string &path) {
     return stat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode);
 }
 
-void set_values(const words &read, options &out) {
-    out.mode = read.mode == "highlight" ? TAVO_MODE_HIGHLIGHT
-               : read.mode == "beats"   ? TAVO_MODE_BEATS
-                                        : TAVO_MODE_BOTH;
-    out.format = read.format == "json"     ? result_format::json
-                 : read.format == "csv"    ? result_format::csv
-                 : read.format == "labels" ? result_format::labels
-                                           : result_format::text;
+void set_values(const raw_values &raw, options &out) {
+    out.mode = raw.mode == "highlight" ? TAVO_MODE_HIGHLIGHT
+               : raw.mode == "beats"   ? TAVO_MODE_BEATS
+                                       : TAVO_MODE_BOTH;
+    out.format = raw.format == "json"     ? result_format::json
+                 : raw.format == "csv"    ? result_format::csv
+                 : raw.format == "labels" ? result_format::labels
+                                          : result_format::text;
     unshield(out.click);
     unshield(out.plot);
     unshield(out.output_dir);
     for (std::string &input : out.inputs) unshield(input);
     for (std::string &list : out.lists) unshield(list);
-    if (read.null_separated) out.list_separator = '\0';
+    if (raw.null_separated) out.list_separator = '\0';
 }
 
-// What no single option can say about itself. Empty when all is well.
+bool takes_one_file(const options &out) {
+    return out.inputs.size() == 1 && out.inputs[0] != "-" && out.lists.empty() &&
+           !is_folder(out.inputs[0]);
+}
+
+// What is wrong with options that are right by themselves. Empty when all is well.
 std::string contradiction(const options &out, bool null_separated) {
-    bool list_on_stdin = false;
-    for (const std::string &input : out.inputs) list_on_stdin = list_on_stdin || input == "-";
+    const bool list_on_stdin =
+        std::find(out.inputs.begin(), out.inputs.end(), "-") != out.inputs.end();
     if (out.inputs.empty() && out.lists.empty()) {
         return "name at least one audio file, a folder, or '-' for a list on standard input.";
     }
     if (null_separated && !list_on_stdin && out.lists.empty()) {
         return "-0 is about lists of files: give '-' or --files-from.";
     }
-    if (!out.output_dir.empty() && out.format != result_format::labels) {
-        return "--output-dir goes with --format labels.";
+    if (!out.output_dir.empty() && !writes_files(out.format)) {
+        return "--output-dir goes with the formats that write files, like --format labels.";
     }
+    if (out.skip_existing && !writes_files(out.format)) {
+        return "--skip-existing goes with the formats that write files, like --format labels.";
+    }
+    if (out.skip_existing && out.force) return "--skip-existing and --force exclude each other.";
     if (!out.output_dir.empty() && !is_folder(out.output_dir)) {
         return out.output_dir + ": is not a folder.";
     }
@@ -153,13 +190,26 @@ std::string contradiction(const options &out, bool null_separated) {
         return "--click needs beats: --mode beats or both.";
     }
     if (!out.click.empty() && out.click == out.plot) return "--click and --plot name one file.";
-    const bool single = !out.click.empty() || !out.plot.empty();
-    if (single && (out.inputs.size() != 1 || list_on_stdin || !out.lists.empty() ||
-                   is_folder(out.inputs[0]))) {
+    if ((!out.click.empty() || !out.plot.empty()) && !takes_one_file(out)) {
         return std::string(out.click.empty() ? "--plot" : "--click") +
                " takes exactly one audio file.";
     }
     return "";
+}
+
+// Says which options do other than a newcomer may expect.
+void write_notes(const options &out) {
+    if (out.quiet) return;
+    if (out.length_s > 0 && out.mode == TAVO_MODE_BEATS) {
+        fputs("tavo: --length has no effect in mode beats.\n", stderr);
+    }
+    if (out.max_beats > 0 && out.mode == TAVO_MODE_HIGHLIGHT) {
+        fputs("tavo: --max-beats has no effect in mode highlight.\n", stderr);
+    }
+    if (!out.click.empty() && out.mode == TAVO_MODE_BOTH) {
+        fputs("tavo: the click track starts at the highlight; --mode beats clicks all of it.\n",
+              stderr);
+    }
 }
 
 }  // namespace
@@ -169,19 +219,23 @@ std::optional<int> parse_options(int argc, char **argv, options &out) {
     app.footer(kFooter);
     app.get_formatter()->column_width(28);
     app.set_version_flag("--version", std::string("tavo ") + TAVO_VERSION);
-    words read;
-    declare_inputs(app, out, read);
-    declare_analysis(app, out, read);
-    declare_output(app, out, read);
+    raw_values raw;
+    declare_inputs(app, out, raw);
+    declare_analysis(app, out, raw);
+    declare_output(app, out, raw);
     try {
         app.parse(shielded(argc, argv));
     } catch (const CLI::Success &done) {
-        return app.exit(done) == 0 ? kExitOk : kExitUsage;
+        const int status = app.exit(done) == 0 ? kExitOk : kExitUsage;
+        if (std::cout.flush()) return status;
+        perror("tavo: the output cannot be written");
+        return kExitFailed;
     } catch (const CLI::ParseError &wrong) {
         return wrong_usage(wrong.what());
     }
-    set_values(read, out);
-    const std::string why = contradiction(out, read.null_separated);
-    if (!why.empty()) return wrong_usage(why);
+    set_values(raw, out);
+    const std::string sentence = contradiction(out, raw.null_separated);
+    if (!sentence.empty()) return wrong_usage(sentence);
+    write_notes(out);
     return std::nullopt;
 }

@@ -16,8 +16,9 @@ struct options {
     result_format format = result_format::text;
     std::string click;       // where the click track goes, empty for none
     std::string plot;        // where the picture goes, empty for none
-    std::string output_dir;  // of labels; empty: beside each input
+    std::string output_dir;  // of marker files; empty: beside each input
     bool force = false;
+    bool skip_existing = false;
     bool quiet = false;
     bool recursive = false;
     int32_t jobs = 1;

@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <csignal>
 
 #include "cli/format.h"
 #include "cli/stop.h"
@@ -31,17 +32,21 @@ void write_reply(ordered_output &out, const reply &made) {
 
 }  // namespace
 
-ordered_output start_output(const options &opts, size_t total) {
+ordered_output start_output(const options &opts) {
     ordered_output out;
-    out.total = total;
     struct stat info {};
     out.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
-    out.bar = start_progress(total, opts.quiet);
+    out.bar = start_progress(opts.quiet);
     write_result(out, format_head(opts.format));
     return out;
 }
 
-void accept_reply(ordered_output &out, uint32_t index, reply &&made) {
+void set_total(ordered_output &out, size_t total) {
+    out.total = total;
+    out.bar.total = total;
+}
+
+void accept_reply(ordered_output &out, size_t index, reply &&made) {
     if (made.status != outcome::stopped) ++out.done;
     out.waiting.emplace(index, std::move(made));
     auto first = out.waiting.begin();
@@ -82,9 +87,12 @@ int finish_output(ordered_output &out, bool unclean) {
             "tavo: " + system_sentence("The results cannot be written", out.write_error) + "\n");
     }
     if (stop_signal() != 0) {
-        write_message(out, "tavo: stopped; " + std::to_string(out.done) + " of " +
-                               std::to_string(out.total) + " files are done.\n");
+        const std::string done =
+            out.total == 0 ? count_text(out.done, "file")
+                           : std::to_string(out.done) + " of " + count_text(out.total, "file");
+        write_message(out, "tavo: stopped; " + done + " done.\n");
         return kExitSignal + stop_signal();
     }
+    if (out.reader_gone) return kExitSignal + SIGPIPE;
     return out.a_file_failed || out.write_error != 0 || unclean ? kExitFailed : kExitOk;
 }

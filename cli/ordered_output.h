@@ -13,19 +13,20 @@
 #include "cli/worker.h"
 
 struct ordered_output {
-    std::map<uint32_t, reply> waiting;  // for earlier inputs
-    uint32_t next = 0;                  // input to write
-    size_t total = 0;                   // inputs
-    size_t done = 0;                    // replies of analyses that were not stopped
+    std::map<size_t, reply> waiting;  // for earlier inputs
+    size_t next = 0;                  // input to write
+    size_t total = 0;                 // inputs; 0 while not all are known
+    size_t done = 0;                  // replies of analyses that were not stopped
     bool a_file_failed = false;
-    bool reader_gone = false;  // standard output was closed by its reader
+    bool reader_gone = false;  // standard output was closed by its reader, with results to come
     int write_error = 0;       // errno of any other failure on standard output
     bool to_pipe = false;      // standard output is a pipe, whose reader may go
     progress bar;
 };
 
-ordered_output start_output(const options &opts, size_t total);
-void accept_reply(ordered_output &out, uint32_t index, reply &&made);
+ordered_output start_output(const options &opts);
+void set_total(ordered_output &out, size_t total);  // once all inputs are known
+void accept_reply(ordered_output &out, size_t index, reply &&made);
 void write_message(ordered_output &out, const std::string &text);
 void note_reader_gone(ordered_output &out);
 bool output_failed(const ordered_output &out);

@@ -87,11 +87,7 @@ double x_of(const plot_data &data, double ms) {
 }
 
 std::string highlight_words(const record &result) {
-    std::string words = "highlight " + clock_text(result.hl_pos_ms);
-    if (result.length_s > 0) {
-        words += " to " + clock_text(result.hl_pos_ms + 1000.0 * result.length_s);
-    }
-    return words;
+    return "highlight " + highlight_text(result);
 }
 
 std::string stream_words(const record &result, const plot_data &data) {
@@ -113,8 +109,7 @@ std::string description(const record &result, const plot_data &data) {
     std::string words = stream_words(result, data);
     if (result.has_highlight) words += ", " + highlight_words(result);
     if (result.has_beats) {
-        words += ", " + std::to_string(result.bpm) + " BPM, " +
-                 count_text(result.beats_ms.size(), "beat");
+        words += ", " + tempo_text(result) + ", " + count_text(result.beats_ms.size(), "beat");
     }
     return words;
 }

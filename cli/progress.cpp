@@ -5,9 +5,10 @@
 
 #include <algorithm>
 #include <array>
-#include <cmath>
 #include <cstdio>
 #include <string>
+
+#include "cli/words.h"
 
 namespace {
 
@@ -21,40 +22,27 @@ size_t terminal_columns() {
     return size.ws_col;
 }
 
-std::string time_left(double seconds) {
-    const long long whole = std::llround(seconds);
-    std::array<char, 48> text{};
-    if (whole >= 3600) {
-        snprintf(text.data(), text.size(), "%lld:%02lld:%02lld left", whole / 3600, whole / 60 % 60,
-                 whole % 60);
-    } else {
-        snprintf(text.data(), text.size(), "%lld:%02lld left", whole / 60, whole % 60);
-    }
-    return text.data();
-}
-
 std::string numbers(const progress &bar, size_t done, double seconds) {
-    std::array<char, 96> text{};
     const double rate = static_cast<double>(done) / seconds;
-    snprintf(text.data(), text.size(), " %zu/%zu files, %.1f a minute, ", done, bar.total,
-             rate * 60.0);
-    const std::string left =
-        done == 0 ? "time unknown" : time_left(static_cast<double>(bar.total - done) / rate);
-    return text.data() + left;
+    std::array<char, 48> speed{};
+    snprintf(speed.data(), speed.size(), ", %.1f a minute", rate * 60.0);
+    if (bar.total == 0) return count_text(done, "file") + speed.data();
+    const double left_ms = 1000.0 * static_cast<double>(bar.total - done) / rate;
+    return " " + std::to_string(done) + "/" + std::to_string(bar.total) + " files" + speed.data() +
+           (done == 0 ? ", time unknown" : ", " + whole_clock_text(left_ms) + " left");
 }
 
 }  // namespace
 
-progress start_progress(size_t total, bool quiet) {
+progress start_progress(bool quiet) {
     progress bar;
-    bar.shown = !quiet && total > 1 && isatty(STDERR_FILENO) == 1;
-    bar.total = total;
+    bar.shown = !quiet && isatty(STDERR_FILENO) == 1;
     bar.started = std::chrono::steady_clock::now();
     return bar;
 }
 
 void draw_progress(progress &bar, size_t done) {
-    if (!bar.shown) return;
+    if (!bar.shown || bar.total == 1) return;
     const std::chrono::duration<double> run = std::chrono::steady_clock::now() - bar.started;
     if (run.count() < kFirstDrawSeconds) return;
 
@@ -63,7 +51,7 @@ void draw_progress(progress &bar, size_t done) {
     const size_t room = columns > tail.size() + 2 ? columns - tail.size() - 2 : 0;
     const size_t width = std::min(room, kMostBarColumns);
     std::string line;
-    if (width > 0) {
+    if (width > 0 && bar.total > 0) {
         const size_t filled = width * done / bar.total;
         line = "[" + std::string(filled, '#') + std::string(width - filled, '-') + "]";
     }

@@ -1,5 +1,5 @@
 // What the command knows about one file after its analysis. Filled by analyse.h, written out by the
-// formats (format.h).
+// formats (format.h, markers.h).
 #ifndef TAVO_CLI_RECORD_H
 #define TAVO_CLI_RECORD_H
 
@@ -32,9 +32,19 @@ struct record {
     int32_t bpm = 0;
     std::vector<float> beats_ms;  // ascending, from the start of the file
 
+    int64_t cpu_ms = -1;  // processor time of the analysis, all threads; -1 without one
+
     std::string written;  // the file that holds the result, where the format makes one
 };
 
 record failed_record(const std::string &file, int32_t mode, const std::string &error);
+
+// Where a highlight of length_s seconds ends: at the end of the song at the latest.
+double highlight_end_ms(const record &result, int32_t length_s);
+
+// Whether the highlight's start is exact to 0.4 s. If not it is a point of the coarse curve.
+// In mode both this is not known: a seek has moved the start.
+bool has_refinement(const record &result);
+bool is_refined(const record &result);
 
 #endif

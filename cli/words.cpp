@@ -32,17 +32,35 @@ const char *status_word(outcome status) {
     return "failed";
 }
 
-std::string clock_text(double ms) {
-    const long long tenths = std::llround(ms / 100.0);
-    const long long whole = tenths / 10;
+std::string whole_clock_text(double ms) {
+    const long long whole = std::llround(ms / 1000.0);
     std::array<char, 48> text{};
     if (whole >= 3600) {
-        snprintf(text.data(), text.size(), "%lld:%02lld:%02lld.%lld", whole / 3600, whole / 60 % 60,
-                 whole % 60, tenths % 10);
+        snprintf(text.data(), text.size(), "%lld:%02lld:%02lld", whole / 3600, whole / 60 % 60,
+                 whole % 60);
     } else {
-        snprintf(text.data(), text.size(), "%lld:%02lld.%lld", whole / 60, whole % 60, tenths % 10);
+        snprintf(text.data(), text.size(), "%lld:%02lld", whole / 60, whole % 60);
     }
     return text.data();
+}
+
+std::string clock_text(double ms) {
+    const long long tenths = std::llround(ms / 100.0);
+    return whole_clock_text(static_cast<double>(tenths / 10 * 1000)) + "." +
+           std::to_string(tenths % 10);
+}
+
+std::string highlight_text(const record &result) {
+    const bool about = has_refinement(result) && !is_refined(result);
+    const auto clock = about ? whole_clock_text : clock_text;
+    std::string text = (about ? "about " : "") + clock(result.hl_pos_ms);
+    if (result.length_s > 0) text += " to " + clock(highlight_end_ms(result, result.length_s));
+    return text;
+}
+
+std::string tempo_text(const record &result) {
+    return std::to_string(result.bpm) + " BPM" +
+           (result.mode == TAVO_MODE_BOTH ? " from the highlight on" : "");
 }
 
 std::string number_text(float value) {

@@ -11,8 +11,15 @@
 const char *mode_word(int32_t mode);
 const char *status_word(outcome status);
 
-// m:ss.t, or h:mm:ss.t from an hour on.
+// m:ss.t, or h:mm:ss.t from an hour on; without tenths where the time is a whole second anyway.
 std::string clock_text(double ms);
+std::string whole_clock_text(double ms);
+
+// "0:30.2 to 1:00.2"; "about 0:36" when the start is not refined.
+std::string highlight_text(const record &result);
+
+// "117 BPM", in mode both "117 BPM from the highlight on".
+std::string tempo_text(const record &result);
 
 // The shortest decimal that gives the same float again.
 std::string number_text(float value);

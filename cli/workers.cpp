@@ -7,8 +7,10 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <optional>
+#include <deque>
+#include <vector>
 
+#include "cli/inputs.h"
 #include "cli/ordered_output.h"
 #include "cli/stop.h"
 #include "cli/words.h"
@@ -16,22 +18,34 @@
 
 namespace {
 
+constexpr size_t kMostAhead = 10'000;   // inputs found before they can be analysed
+constexpr size_t kFoundAtOnce = 64;     // between two looks at the workers
+constexpr size_t kMostWaiting = 1'000;  // results kept back for an earlier one
+
+struct numbered_input {
+    size_t index;
+    input entry;
+};
+
 struct process {
     pid_t pid = -1;
-    int request_fd = -1;            // -1 once the worker was told to end
-    int reply_fd = -1;              // -1 once the worker is gone
-    std::optional<uint32_t> asked;  // the input that it has
-    std::string received;           // of the reply under way
+    int request_fd = -1;  // -1 once the worker was told to end
+    int reply_fd = -1;    // -1 once the worker is gone
+    bool busy = false;
+    numbered_input asked;  // while busy
+    std::string received;  // of the reply under way
 };
 
 struct worker_pool {
     const options &opts;
-    const std::vector<input> &inputs;
+    input_supply supply;
+    supply_state found;  // by the last search
+    std::deque<numbered_input> queue;
+    size_t count;  // inputs found so far
     ordered_output output;
     std::vector<process> processes;
-    size_t next = 0;       // input to hand out
-    bool ending = false;   // nothing is handed out any more
-    bool unclean = false;  // a worker without a file ended badly
+    bool ending;   // nothing is handed out any more
+    bool unclean;  // a worker without a file ended badly
 };
 
 void close_fd(int &fd) {
@@ -46,7 +60,7 @@ void close_fd(int &fd) {
         close_fd(other.reply_fd);
     }
     ignore_stop_signals();
-    const int status = serve_requests(request_fd, reply_fd, pool.opts, pool.inputs);
+    const int status = serve_requests(request_fd, reply_fd, pool.opts);
     exit(status);
 }
 
@@ -77,36 +91,73 @@ int start_process(worker_pool &pool) {
     return 0;
 }
 
-void fail_input(worker_pool &pool, uint32_t index, const std::string &error) {
-    const record result = failed_record(pool.inputs[index].path, pool.opts.mode, error);
-    accept_reply(pool.output, index, make_reply(result, pool.opts));
+void fail_input(worker_pool &pool, const numbered_input &failed, const std::string &error) {
+    const record result = failed_record(failed.entry.path, pool.opts.mode, error);
+    accept_reply(pool.output, failed.index, make_reply(result, pool.opts));
+}
+
+bool may_search(const worker_pool &pool) {
+    return !pool.ending && pool.found != supply_state::ended && pool.queue.size() < kMostAhead;
+}
+
+// Finds a few more inputs, unless enough are waiting.
+void search_inputs(worker_pool &pool) {
+    for (size_t i = 0; i < kFoundAtOnce && may_search(pool); ++i) {
+        numbered_input next;
+        pool.found = next_input(pool.supply, next.entry);
+        if (pool.found == supply_state::waiting) break;
+        if (pool.found == supply_state::ended) {
+            set_total(pool.output, pool.count);
+            break;
+        }
+        next.index = pool.count++;
+        pool.queue.push_back(std::move(next));
+    }
+    if (!pool.opts.quiet) write_message(pool.output, pool.supply.notes);
+    pool.supply.notes.clear();
 }
 
 process *find_idle(worker_pool &pool) {
     for (process &worker : pool.processes) {
-        if (worker.request_fd >= 0 && !worker.asked) return &worker;
+        if (worker.request_fd >= 0 && !worker.busy) return &worker;
     }
     return nullptr;
 }
 
+void send_request(process &worker, numbered_input &&next) {
+    const request_head head = {next.index, next.entry.path.size()};
+    std::string sent(reinterpret_cast<const char *>(&head), sizeof head);
+    sent += next.entry.path;
+    worker.busy = true;
+    worker.asked = std::move(next);
+    // A worker that died meanwhile shows at its reply pipe's end.
+    write_all(worker.request_fd, sent.data(), sent.size());
+}
+
 // Gives every idle worker an input, starting workers up to the number asked for.
 void hand_out(worker_pool &pool) {
-    while (!pool.ending && pool.next < pool.inputs.size()) {
+    while (!pool.ending && !pool.queue.empty()) {
+        const numbered_input &first = pool.queue.front();
+        if (first.index >= pool.output.next + kMostWaiting) return;
+        if (!first.entry.error.empty()) {
+            fail_input(pool, first, first.entry.error);
+            pool.queue.pop_front();
+            continue;
+        }
         process *worker = find_idle(pool);
         if (worker == nullptr && pool.processes.size() < static_cast<size_t>(pool.opts.jobs)) {
             const int code = start_process(pool);
             worker = code == 0 ? &pool.processes.back() : nullptr;
             if (code != 0 && pool.processes.empty()) {
-                fail_input(pool, static_cast<uint32_t>(pool.next++),
+                fail_input(pool, first,
                            system_sentence("The analysis process could not be started", code));
+                pool.queue.pop_front();
                 continue;
             }
         }
         if (worker == nullptr) return;
-        const auto index = static_cast<uint32_t>(pool.next++);
-        worker->asked = index;
-        // A worker that died meanwhile shows at its reply pipe's end.
-        write_all(worker->request_fd, reinterpret_cast<const char *>(&index), sizeof(index));
+        send_request(*worker, std::move(pool.queue.front()));
+        pool.queue.pop_front();
     }
 }
 
@@ -130,8 +181,8 @@ void bury(worker_pool &pool, process &worker) {
     int status = 0;
     while (waitpid(worker.pid, &status, 0) < 0 && errno == EINTR) {
     }
-    if (worker.asked) {
-        fail_input(pool, *worker.asked,
+    if (worker.busy) {
+        fail_input(pool, worker.asked,
                    "The process that analysed this file was ended " + ending_text(status) + ".");
     } else if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) {
         pool.unclean = true;
@@ -144,16 +195,16 @@ void bury(worker_pool &pool, process &worker) {
 // Takes whole replies out of what a worker has sent; there is at most one.
 void take_reply(worker_pool &pool, process &worker) {
     reply_head head{};
-    if (worker.received.size() < sizeof(head)) return;
-    memcpy(&head, worker.received.data(), sizeof(head));
-    const size_t size = sizeof(head) + head.result_bytes + head.message_bytes;
+    if (worker.received.size() < sizeof head) return;
+    memcpy(&head, worker.received.data(), sizeof head);
+    const size_t size = sizeof head + head.result_bytes + head.message_bytes;
     if (worker.received.size() < size) return;
     reply made;
-    made.status = static_cast<outcome>(head.status);
-    made.result = worker.received.substr(sizeof(head), head.result_bytes);
-    made.message = worker.received.substr(sizeof(head) + head.result_bytes, head.message_bytes);
+    made.status = head.status;
+    made.result = worker.received.substr(sizeof head, head.result_bytes);
+    made.message = worker.received.substr(sizeof head + head.result_bytes, head.message_bytes);
     worker.received.erase(0, size);
-    worker.asked.reset();
+    worker.busy = false;
     accept_reply(pool.output, head.index, std::move(made));
 }
 
@@ -168,43 +219,58 @@ void read_from(worker_pool &pool, process &worker) {
     }
 }
 
-// One wait for whatever comes next: replies, a stop, the reader of the results gone.
+// Takes the processes that are gone out of the list.
+void remove_buried(worker_pool &pool) {
+    size_t kept = 0;
+    for (process &worker : pool.processes) {
+        if (worker.pid < 0) continue;
+        if (&pool.processes[kept] != &worker) pool.processes[kept] = std::move(worker);
+        ++kept;
+    }
+    pool.processes.resize(kept);
+}
+
+// Waits for whatever comes next: replies, names in a list, a stop, the reader of the results gone.
+// Returns at once while there are inputs to be found.
 void wait_and_serve(worker_pool &pool) {
+    const bool listening = may_search(pool) && pool.found == supply_state::waiting;
+    const bool searching = may_search(pool) && !listening;
     std::vector<pollfd> watched;
     watched.push_back({pool.ending ? -1 : stop_fd(), POLLIN, 0});
     watched.push_back({pool.output.to_pipe && !pool.ending ? STDOUT_FILENO : -1, 0, 0});
+    watched.push_back({listening ? supply_fd(pool.supply) : -1, POLLIN, 0});
     for (const process &worker : pool.processes) watched.push_back({worker.reply_fd, POLLIN, 0});
-    const int ready = poll(watched.data(), watched.size(), redraw_timeout_ms(pool.output));
-    if (ready > 0) {
+    const int timeout = searching ? 0 : redraw_timeout_ms(pool.output);
+    if (poll(watched.data(), watched.size(), timeout) > 0) {
         if ((watched[1].revents & POLLERR) != 0) note_reader_gone(pool.output);
         for (size_t i = 0; i < pool.processes.size(); ++i) {
-            if (watched[i + 2].revents != 0) read_from(pool, pool.processes[i]);
+            if (watched[i + 3].revents != 0) read_from(pool, pool.processes[i]);
         }
-        size_t kept = 0;
-        for (process &worker : pool.processes) {
-            if (worker.pid < 0) continue;
-            if (&pool.processes[kept] != &worker) pool.processes[kept] = std::move(worker);
-            ++kept;
-        }
-        pool.processes.resize(kept);
+        remove_buried(pool);
     }
     redraw(pool.output);
 }
 
+bool is_busy(const worker_pool &pool) {
+    for (const process &worker : pool.processes) {
+        if (worker.busy) return true;
+    }
+    return false;
+}
+
 }  // namespace
 
-int run_workers(const options &opts, const std::vector<input> &inputs) {
-    worker_pool pool{opts, inputs, start_output(opts, inputs.size()), {}, 0, false, false};
+int run_workers(const options &opts) {
+    worker_pool pool{opts,  {opts}, supply_state::ready, {}, 0, start_output(opts), {},
+                     false, false};
     while (true) {
-        const bool stop = stop_requested() || output_failed(pool.output);
-        if (!pool.ending && (stop || pool.next >= inputs.size())) {
-            // Only a stop may reach workers that still have a file.
-            bool busy = false;
-            for (const process &worker : pool.processes) busy = busy || worker.asked;
-            if (stop || !busy) tell_to_end(pool);
-        }
+        search_inputs(pool);
         hand_out(pool);
-        if (pool.processes.empty() && (pool.ending || pool.next >= inputs.size())) break;
+        const bool stop = stop_requested() || output_failed(pool.output);
+        const bool exhausted = pool.found == supply_state::ended && pool.queue.empty();
+        // Only a stop may reach workers that still have a file.
+        if (!pool.ending && (stop || (exhausted && !is_busy(pool)))) tell_to_end(pool);
+        if (pool.processes.empty() && pool.ending) break;
         wait_and_serve(pool);
     }
     return finish_output(pool.output, pool.unclean);

@@ -3,13 +3,10 @@
 #ifndef TAVO_CLI_WORKERS_H
 #define TAVO_CLI_WORKERS_H
 
-#include <vector>
-
-#include "cli/inputs.h"
 #include "cli/options.h"
 
 // Returns the command's exit status. Single-threaded, so that a fork is safe at any moment; in a
 // worker process it does not return.
-int run_workers(const options &opts, const std::vector<input> &inputs);
+int run_workers(const options &opts);
 
 #endif
