@@ -24,7 +24,7 @@ _tavo() {
             if [[ $word == -* ]]; then
                 mapfile -t COMPREPLY < <(compgen -W '-h --help --version
                     -m --mode -l --length --max-beats -j --jobs
-                    -f --format -o --output-dir --force --click --plot -q --quiet
+                    -f --format -o --output-dir --force --skip-existing --click --plot -q --quiet
                     -r --recursive --files-from -0 --null' -- "$word")
             else
                 mapfile -t COMPREPLY < <(compgen -f -- "$word")

@@ -90,7 +90,7 @@ class Outputs(Case):
                 self.assertEqual(done.stdout, b"")
         self.assert_only("song.wav", "silent.wav", "bad.wav")
 
-    def test_label_tracks_in_another_folder(self):
+    def test_another_folder(self):
         self.put("x/song.wav")
         self.put("y/song.wav", source=short_song(seed=7))
         out = self.folder / "out"
@@ -98,13 +98,34 @@ class Outputs(Case):
         for _ in range(2):  # the second is refused whichever is done first
             done = self.run_tavo(*LABELS[0], "--force", "-o", "out", "-j", "2", "x", "y", status=1)
             self.assertEqual(done.stdout, b"out/song.wav.labels.txt\n")
-            self.assertTrue(done.stderr.startswith(b"tavo: y/song.wav: Its label track would"))
+            self.assertTrue(done.stderr.startswith(b"tavo: y/song.wav: Its file out/song.wav."))
         self.assertEqual(os.listdir(out), [LABELS[1]])
         self.assertEqual(os.listdir(self.folder / "x"), ["song.wav"])
         os.chmod(out, 0o555)
         done = self.run_tavo(*LABELS[0], "--force", "-o", "out", "x", status=1,
                              before=AS_ORDINARY_USER)
         self.assertIn(b"cannot be written: permission denied", done.stderr)
+
+    def test_each_file_once(self):
+        self.put("other.wav")
+        done = self.run_tavo(*LABELS[0], "song.wav", "./song.wav", "other.wav")
+        self.assertEqual(done.stdout.count(b"\n"), 2)
+        self.assertEqual(done.stderr, b"tavo: ./song.wav: named more than once, done once.\n")
+        (self.folder / LABELS[1]).write_bytes(b"mine\n")
+        done = self.run_tavo(*LABELS[0], "--skip-existing", "song.wav", "other.wav", ".")
+        self.assertEqual((done.stdout, (self.folder / LABELS[1]).read_bytes()), (b"", b"mine\n"))
+        self.assertIn(b"4 inputs left out", done.stderr)
+
+    def test_names_as_long_as_they_may_be(self):
+        names = ["\u00e9" * 120 + ending for ending in ("-one.wav", "-two.wav")]  # 248 bytes
+        for name in names:
+            self.put(name)
+        for arguments in ([], ["-o", "."]):
+            done = self.run_tavo(*LABELS[0], "--force", *arguments, *names)
+            written = done.stdout.decode().splitlines()
+            self.assertEqual(len(set(written)), 2)
+            for path in written:
+                self.assertTrue(path.endswith(".labels.txt") and (self.folder / path).is_file())
 
     def test_a_stop_while_drawing(self):
         # A stop at any moment: no picture, or all of it. About half of the time is drawing.

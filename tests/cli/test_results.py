@@ -1,13 +1,59 @@
-"""What the command says about files that it can use, in every format; wrong usage."""
+"""What the command says in every format: results, refused files, wrong usage."""
 import csv
 import io
+import os
 import struct
+import subprocess
 
-from command_case import LOUD_S, Case, standard_song
+from command_case import AS_ORDINARY_USER, LOUD_S, TAVO, Case, song, standard_song, wav
 
 KEYS = ["file", "mode", "status", "sample_rate", "channels", "duration_ms"]
-HIGHLIGHT = ["hl_pos_ms"]
 BEATS = ["bpm", "beat_count", "beats_ms"]
+ASF = bytes.fromhex("3026b2758e66cf11a6d900aa0062ce6c")
+
+USAGE = [
+    ([], "name at least one"),
+    (["--mode", "all", "a.wav"], "--mode"),
+    (["--length", "-1", "a.wav"], "'-1' is not a whole number of seconds"),
+    (["--length", "30.5", "a.wav"], "'30.5' is not a whole number of seconds"),
+    (["--max-beats", "99999999999", "a.wav"], "--max-beats"),
+    (["--format", "xml", "a.wav"], "--format"),
+    (["-j", "0", "a.wav"], "--jobs"),
+    (["--unknown", "a.wav"], "--unknown"),
+    (["-0", "a.wav"], "-0"),
+    (["--output-dir", ".", "a.wav"], "--format labels"),
+    (["--skip-existing", "a.wav"], "--format labels"),
+    (["--skip-existing", "--force", "-f", "labels", "a.wav"], "exclude each other"),
+    (["--format", "labels", "--output-dir", "nowhere", "a.wav"], "nowhere"),
+    (["--click", "c.wav", "."], "--click takes exactly one"),
+    (["--click", "c.wav", "--mode", "highlight", "a.wav"], "needs beats"),
+    (["--plot", "p.svg", "a.wav", "b.wav"], "--plot takes exactly one"),
+    (["--plot", "p.svg", "-"], "--plot takes exactly one"),
+    (["--plot", "p", "--click", "p", "a.wav"], "name one file"),
+]
+REFUSED = [  # name, content, a part of the sentence
+    ("empty.wav", b"", "empty"),
+    ("fifteen.wav", b"RIFF\0\0\0\0WAVEfmt", "too short to be audio: it has 15 bytes"),
+    ("text.wav", b"This is a letter, not a song.\n" * 99, "not recognised"),
+    ("movie.wma", ASF + bytes(500), "ASF (Windows Media), a format that is refused. ffmpeg -i"),
+    ("8.wav", wav(bits=8), "8-bit samples"),
+    ("24.wav", wav(bits=24), "24-bit samples. Only 16-bit integer PCM at up to 48000 Hz is read from "
+                             "WAV; ffmpeg -i FILE -c:a pcm_s16le -ar 44100 NEW.wav converts it."),
+    ("float.wav", wav(bits=32, tag=3), "32-bit floating-point"),
+    ("alaw.wav", wav(bits=8, tag=6), "format tag 6"),
+    ("96k.wav", wav(rate=96000), "96000 Hz"),
+    ("1s.wav", wav(seconds=1.0), "lasts 1.000 s"),
+    ("7999.wav", wav(rate=7999), "7999 Hz"),
+    ("no-channels.wav", wav(seconds=0.0)[:22] + b"\0\0" + wav()[24:], "0 channels"),
+    ("no-data.wav", wav()[:36], "no usable audio stream"),
+    ("lies.wav", wav(seconds=0.5, data_size=0xFFFFFFFF), "lasts 0.500 s"),
+    ("silence.wav", wav(seconds=7.0, sample=b"\0"), "No beats were found"),
+]
+NOTES = [  # arguments, what standard error says
+    (["--length", "10", "--mode", "beats"], "--length has no effect in mode beats"),
+    (["--max-beats", "9", "--mode", "highlight"], "--max-beats has no effect in mode highlight"),
+    (["--click", "c.wav", "--force"], "the click track starts at the highlight"),
+]
 
 
 def as_single(times):
@@ -16,26 +62,7 @@ def as_single(times):
 
 class Results(Case):
     def test_wrong_usage(self):
-        cases = [
-            ([], "name at least one"),
-            (["--mode", "all", "a.wav"], "--mode"),
-            (["--length", "-1", "a.wav"], "--length"),
-            (["--length", "ten", "a.wav"], "--length"),
-            (["--max-beats", "99999999999", "a.wav"], "--max-beats"),
-            (["--format", "xml", "a.wav"], "--format"),
-            (["-j", "0", "a.wav"], "--jobs"),
-            (["--unknown", "a.wav"], "--unknown"),
-            (["-0", "a.wav"], "-0"),
-            (["--output-dir", ".", "a.wav"], "--format labels"),
-            (["--format", "labels", "--output-dir", "nowhere", "a.wav"], "nowhere"),
-            (["--click", "c.wav", "."], "--click takes exactly one"),
-            (["--click", "c.wav", "--mode", "highlight", "a.wav"], "needs beats"),
-            (["--plot", "p.svg", "a.wav", "b.wav"], "--plot takes exactly one"),
-            (["--plot", "p.svg", "-"], "--plot takes exactly one"),
-            (["--plot", "p.svg", "--files-from", "l", "a.wav"], "--plot takes exactly one"),
-            (["--plot", "p", "--click", "p", "a.wav"], "name one file"),
-        ]
-        for arguments, said in cases:
+        for arguments, said in USAGE:
             with self.subTest(arguments=arguments):
                 done = self.run_tavo(*arguments, status=2)
                 self.assertEqual(done.stdout, b"")
@@ -49,40 +76,100 @@ class Results(Case):
         return result
 
     def test_json_of_each_mode(self):
-        for mode, keys in (("highlight", HIGHLIGHT), ("beats", BEATS), ("both", HIGHLIGHT + BEATS)):
+        for mode, keys in (("highlight", ["hl_pos_ms", "hl_end_ms", "hl_refined"]),
+                           ("beats", BEATS), ("both", ["hl_pos_ms", "hl_end_ms"] + BEATS)):
             with self.subTest(mode=mode):
-                result = self.analyse("--mode", mode)
+                result = self.analyse("--mode", mode, "--length", "12")
                 self.assertEqual(list(result), KEYS + keys)
                 self.assertEqual([result[key] for key in KEYS],
                                  ["song.wav", mode, "ok", 44100, 2, 60000])
-                start = result.get("hl_pos_ms", 1000 * LOUD_S)
-                self.assertAlmostEqual(start, 1000 * LOUD_S, delta=1000)  # whole seconds in WAV
-                if mode == "highlight":
-                    continue
-                self.assertIn(result["bpm"], (117, 120, 123))  # neighbours on the grid of hops
-                self.assertGreater(result["beat_count"], 10)
-                self.assertEqual(result["beat_count"], len(result["beats_ms"]))
-                few = self.analyse("--mode", mode, "--max-beats", "3")
-                self.assertLess(few["beat_count"], result["beat_count"])
-        self.assertEqual(self.analyse(), result)  # both is what is done unasked
+                if mode != "beats":
+                    # In mode both a WAV file's highlight moves to a whole second.
+                    self.assertAlmostEqual(result["hl_pos_ms"], 1000 * LOUD_S, delta=1000)
+                    self.assertEqual(result["hl_end_ms"], result["hl_pos_ms"] + 12000)
+                if mode != "highlight":
+                    self.assertIn(result["bpm"], (117, 120, 123))  # neighbours on the grid of hops
+                    self.assertGreater(result["beat_count"], 10)
+                    self.assertEqual(result["beat_count"], len(result["beats_ms"]))
+                    few = self.analyse("--mode", mode, "--max-beats", "3")
+                    self.assertLess(few["beat_count"], result["beat_count"])
+        self.assertNotIn("hl_end_ms", few)
+        self.assertEqual(self.analyse(), self.analyse("--mode", "both"))
+        late = self.analyse("--length", "86400")  # the end is that of the song
+        self.assertEqual(late["hl_end_ms"], late["duration_ms"])
 
     def test_csv_and_text_say_the_same(self):
         result = self.analyse()
         done = self.run_tavo("--format", "csv", "song.wav", "missing, really.wav", status=1)
         rows = list(csv.DictReader(io.StringIO(done.stdout.decode(), newline=""), strict=True))
-        self.assertEqual(list(rows[0]), KEYS + HIGHLIGHT + BEATS + ["error"])
-        for key in KEYS + HIGHLIGHT + ["bpm", "beat_count"]:
+        self.assertEqual(list(rows[0]), KEYS + ["hl_pos_ms", "hl_end_ms", "hl_refined"] + BEATS +
+                         ["cpu_ms", "error"])
+        for key in KEYS + ["hl_pos_ms", "bpm", "beat_count"]:
             self.assertEqual(rows[0][key], str(result[key]))
         self.assertEqual(as_single(rows[0]["beats_ms"].split()), as_single(result["beats_ms"]))
-        self.assertEqual(rows[0]["error"], "")
         self.assertEqual([rows[1][key] for key in ("file", "status", "bpm", "error")],
                          ["missing, really.wav", "failed", "", "The file does not exist."])
-
-        done = self.run_tavo("song.wav", "missing.wav", status=1)
-        self.assertEqual(done.stderr, b"tavo: missing.wav: The file does not exist.\n")
-        text = done.stdout.decode()
+        text = self.run_tavo("song.wav", "missing.wav", status=1).stdout.decode()
         self.assertTrue(text.startswith("song.wav\n"))
         self.assertIn(f"0:{result['hl_pos_ms'] // 1000:02}.{result['hl_pos_ms'] // 100 % 10}", text)
-        self.assertIn(f"{result['bpm']} BPM", text)
+        self.assertIn(f"{result['bpm']} BPM from the highlight on", text)
         self.assertIn(f"{result['beat_count']},", text)
         self.assertNotIn("missing", text)
+
+    def test_a_coarse_highlight_is_called_so(self):
+        # A song too quiet for the refinement: a point of the curve with a value each 2 s.
+        samples = memoryview(standard_song().read_bytes()[44:]).cast("h")
+        quiet = struct.pack(f"<{len(samples)}h", *(s // 16 for s in samples))
+        self.put("quiet.wav", standard_song().read_bytes()[:44] + quiet)
+        self.put("loud.wav", source=standard_song())
+        for name, refined in (("loud.wav", True), ("quiet.wav", False)):
+            (result,) = self.run_json("--mode", "highlight", name)
+            self.assertEqual((result["hl_refined"], result["hl_pos_ms"] % 2000 != 0),
+                             (refined, refined))
+            text = self.run_tavo("--mode", "highlight", name).stdout.decode()
+            clock = f"highlight  about 0:{result['hl_pos_ms'] // 1000:02}\n"
+            self.assertEqual(clock in text, not refined, text)
+
+    def test_refused_files(self):
+        for name, content, said in REFUSED:
+            with self.subTest(name=name):
+                self.put(name, content)
+                done = self.run_tavo("--format", "json", name, status=1)
+                (result,) = self.objects(done.stdout)
+                self.assertEqual((result["file"], result["status"]), (name, "failed"))
+                self.assertIn(said, result["error"])
+                self.assertRegex(result["error"], r"^[A-Z].*\.$")
+                self.assertEqual(done.stderr.decode(), f"tavo: {name}: {result['error']}\n")
+                self.assertNotIn("beats_ms", result)
+
+    def test_no_files(self):
+        os.mkfifo(self.folder / "pipe")
+        (self.folder / "loop").symlink_to("loop")
+        (self.folder / "empty").mkdir()
+        self.put("closed/in.wav")
+        os.chmod(self.put("secret.wav"), 0)
+        os.chmod(self.folder / "closed", 0)
+        self.addCleanup(os.chmod, self.folder / "closed", 0o700)
+        expected = {"pipe": "device, pipe", "/dev/zero": "device, pipe", "loop": "symbolic link",
+                    "empty": "no audio files", "missing": "does not exist",
+                    "secret.wav": "permission denied", "closed": "permission denied",
+                    "closed/in.wav": "permission denied"}
+        results = self.run_json(*expected, status=1, before=AS_ORDINARY_USER)
+        for result, (name, words) in zip(results, expected.items(), strict=True):
+            self.assertEqual(result["file"], name)
+            self.assertIn(words, result["error"])
+
+    def test_notes(self):
+        self.put("song.wav")
+        for arguments, said in NOTES:
+            self.assertIn(said, self.run_tavo(*arguments, "song.wav").stderr.decode())
+            self.assertEqual(self.run_tavo(*arguments, "-q", "song.wav").stderr, b"")
+
+    def test_lost_output_is_a_failure(self):
+        self.put("song.wav")
+        for command, status, said in ((f"'{TAVO}' --help >/dev/full", 1, b"No space left"),
+                                      (f"'{TAVO}' song.wav >/dev/full", 1, b"cannot be written"),
+                                      (f"'{TAVO}' song.wav >&-", 1, b"cannot be written")):
+            done = subprocess.run(command, shell=True, cwd=self.folder, capture_output=True)
+            self.assertEqual(done.returncode, status, command)
+            self.assertIn(said, done.stderr)

@@ -59,12 +59,10 @@ class Workers(Case):
         for i, name in enumerate(names):
             self.put(name, source=short_song(i) if i % 4 else song(seconds=40, seed=i))
         self.put("5.wav", b"RIFF")  # the others go on
-        single = b"".join(self.run_tavo("--format", "json", name, status=int(name == "5.wav")).stdout
-                          for name in names)
+        single = [self.run_json(name, status=int(name == "5.wav"))[0] for name in names]
         for jobs in ("1", "2", "4", "32"):
             with self.subTest(jobs=jobs):
-                done = self.run_tavo("--format", "json", "-j", jobs, *names, status=1)
-                self.assertEqual(done.stdout, single)
+                self.assertEqual(self.run_json("-j", jobs, *names, status=1), single)
 
     def test_a_killed_worker_costs_its_file_only(self):
         names = ["a.wav", "long.wav", "./a.wav", "././a.wav"]
@@ -111,16 +109,13 @@ class Workers(Case):
                     self.assertFalse(os.path.exists(f"/proc/{worker}"))
                     self.assertEqual(process.returncode, status, err)
                     self.assert_finished(out, "a.wav")
-                    self.assertIn(b"stopped; 1 of 3 files are done", err)
+                    self.assertIn(b"stopped; 1 of 3 files done", err)
 
-    def test_a_stop_keeps_what_is_finished_behind_another(self):
+        # Results that wait behind the file that is stopped are finished, too.
         process = self.start("-j", "2", "long.wav", "a.wav", "./a.wav", "other.wav")
-        self.worker_with(process, "long.wav")
-        self.worker_with(process, "other.wav")  # so the other worker's files are done
+        self.worker_with(process, "other.wav")
         process.send_signal(signal.SIGINT)
-        out, err = process.communicate(timeout=120)
-        self.assertEqual(process.returncode, 130, err)
-        self.assert_finished(out, "a.wav", "./a.wav")
+        self.assert_finished(process.communicate(timeout=120)[0], "a.wav", "./a.wav")
 
     def test_a_stop_while_a_list_is_read(self):
         process = self.start("-", stdin=subprocess.PIPE)
@@ -128,33 +123,27 @@ class Workers(Case):
         process.send_signal(signal.SIGINT)
         self.assertEqual(process.wait(timeout=60), 130)
 
-    def test_a_reader_gone_during_an_analysis(self):
+    def test_a_reader_gone(self):
+        """The work ends, without a word, with the status of a broken pipe."""
         process = self.start(*["long.wav"] * 400)
         self.worker_with(process, "long.wav")
         process.stdout.close()
         # One of these takes seconds, all of them minutes.
-        self.assertEqual(process.wait(timeout=60), 0)
+        self.assertEqual(process.wait(timeout=60), 128 + signal.SIGPIPE)
         self.assertEqual(process.stderr.read(), b"")
-
-    def test_a_reader_gone_before_the_first_byte(self):
-        reader, writer = os.pipe()
+        reader, writer = os.pipe()  # gone before the first byte
         os.close(reader)
         process = self.start("a.wav", form="csv", stdout=writer)  # which has a head
         os.close(writer)
         _, err = process.communicate(timeout=120)
-        self.assertEqual((process.returncode, err), (0, b""))
-
-    def test_results_that_cannot_be_written(self):
-        for target in ("/dev/full", "&-"):
-            with self.subTest(target=target):
-                done = subprocess.run(f"'{TAVO}' --format json -j 2 a.wav >{target}", shell=True,
-                                      cwd=self.folder, stderr=subprocess.PIPE, timeout=120)
-                self.assertEqual(done.returncode, 1)
-                self.assertIn(b"The results cannot be written", done.stderr)
+        self.assertEqual((process.returncode, err), (128 + signal.SIGPIPE, b""))
 
     def on_terminal(self, *arguments):
         """What standard error shows on a terminal."""
-        control, terminal = pty.openpty()
+        try:
+            control, terminal = pty.openpty()
+        except OSError:
+            self.skipTest("this system has no terminals")
         process = self.start("-m", "highlight", *arguments,
                              stdout=subprocess.DEVNULL, stderr=terminal)
         os.close(terminal)
