@@ -11,10 +11,10 @@
 extern "C" {
 
 // Thread entries. The argument is the TAVO_CTX. They end their thread by pthread_exit.
-void *analyzeHighlightOnly(void *ctx);  // mode 0
-void *analyzeOnsetOnly(void *ctx);      // mode 1
-void *analyzeOnsetFromeHi(void *ctx);   // mode 2
-void *analyzeHighlight(void *ctx);      // as analyzeHighlightOnly, for direct use
+void *analyzeHighlightOnly(void *arg);  // mode 0
+void *analyzeOnsetOnly(void *arg);      // mode 1
+void *analyzeOnsetFromeHi(void *arg);   // mode 2
+void *analyzeHighlight(void *arg);      // as analyzeHighlightOnly, for direct use
 
 // Only the beat analysis and its report, on an instance whose ana is filled. In mode 2 the beats
 // are shifted by the highlight start. Returns TAVO_OK to its caller, after the callback. An

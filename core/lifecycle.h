@@ -19,7 +19,7 @@ extern pthread_cond_t tavo_cond;
 int32_t _tavo_quit(TAVO_CTX *ctx);
 
 // Thread entry of the watcher that _tavo_quit starts: polls the state, then signals tavo_cond.
-void *_thd_quit_wait(void *ctx);
+void *_thd_quit_wait(void *arg);
 }
 
 #endif

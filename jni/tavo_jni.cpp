@@ -274,7 +274,7 @@ void post(JNIEnv *env, const host_refs *host, jmethodID method, const TAVO_INFO 
 
 extern "C" {
 
-JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *vm, void *) {
+JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *vm, void * /*reserved*/) {
     store_pointer(&java_vm, vm);
     void *env = nullptr;
     return vm->GetEnv(&env, JNI_VERSION_1_6) == JNI_OK ? JNI_VERSION_1_6 : JNI_ERR;
@@ -297,7 +297,7 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobje
     drop_host(env, replaced);
 }
 
-JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject, jstring path,
+JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject /*thiz*/, jstring path,
                                                      jint mode) {
     // Inside an event: a deinit that waits for this thread may hold the lock.
     if (is_posting() && load_pointer(&instance) != nullptr) return already_opened();
@@ -307,8 +307,9 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject, jstri
     return result;
 }
 
-JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *, jobject, jint hl_param,
-                                                        jint max_beats, jint beat_param2) {
+JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv * /*env*/, jobject /*thiz*/,
+                                                        jint hl_param, jint max_beats,
+                                                        jint beat_param2) {
     TAVO_CTX *ctx = load_pointer(&instance);
     if (ctx == nullptr) return 0;
     const int32_t result = tavo_analyze(ctx, hl_param, max_beats, beat_param2);
@@ -321,7 +322,7 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *, jobject, jint 
     return result == TAVO_OK ? 0 : kFailed;
 }
 
-JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *, jobject) {
+JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv * /*env*/, jobject /*thiz*/) {
     TAVO_CTX *posting_ctx = is_posting() ? load_pointer(&instance) : nullptr;
     if (posting_ctx != nullptr) return deinit_failed(posting_ctx, TAVO_ERR_HANDLE);
     pthread_mutex_t *mutex = lock_for_deinit();
@@ -330,7 +331,8 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *, jobject) {
     return result;
 }
 
-JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *, jclass) {
+JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv * /*env*/,
+                                                                  jclass /*host*/) {
     fnamedec = "";
 }
 

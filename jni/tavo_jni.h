@@ -43,7 +43,7 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *env, jobject thi
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *env, jobject thiz);
 
 // Static: sets fnamedec (core/tavo.h) to an empty path, so that no click track is written.
-JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *env, jclass);
+JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *env, jclass host);
 
 // The callback of the bridge's instances. Posts exactly one event: (object, 1, hl_pos, beat_count,
 // float[beat_count] or null) for a result, (object, 2, hl_pos, 0, null) for a failure. If the
