@@ -13,7 +13,7 @@ struct member {
     group *all;
     int32_t index;
     pthread_t thread, ran_on;
-    int runs;
+    int runs, reports;
 };
 
 struct group {
@@ -39,6 +39,7 @@ void work(void *record) {
 
 void report(void *record) {
     auto *self = static_cast<member *>(record);
+    ++self->reports;
     worker_group_done(self->all->mutex, self->all->cond, self->all->done, 4, self->index);
 }
 
@@ -57,7 +58,7 @@ TEST(WorkerGroup, EveryWorkerRunsOnceWhateverCanBeStarted) {
     ASSERT_EQ(worker_lock_create(&all.mutex, &all.cond), 0);
     worker_slot slots[4];
     for (int32_t i = 0; i < 4; ++i) {
-        all.members[i] = {&all, i, {}, {}, 0};
+        all.members[i] = {&all, i, {}, {}, 0, 0};
         slots[i] = {&all.members[i], &all.members[i].thread, enter, work};
     }
     for (int round = 0; round < 512; ++round) {  // the flags of one round are stale in the next
@@ -76,6 +77,8 @@ TEST(WorkerGroup, EveryWorkerRunsOnceWhateverCanBeStarted) {
             ASSERT_EQ(here, (mask >> i & 1) != 0);
         }
     }
+    for (const member &each : all.members)
+        EXPECT_EQ(each.reports, 512 / 2);  // where it was started
     worker_lock_release(&all.mutex, &all.cond);
     EXPECT_EQ(all.mutex, nullptr);
     EXPECT_EQ(all.cond, nullptr);
