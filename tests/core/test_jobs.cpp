@@ -16,8 +16,13 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     TAVO_CTX *ctx = job::create(path, mode);
     EXPECT_NE(ctx, nullptr) << path;
     if (ctx == nullptr) return {};
-    EXPECT_EQ(tavo_analyze(ctx, 0, max_beats, 0), 0);
+    EXPECT_EQ(tavo_analyze(ctx, 20, max_beats, 5), 0);
     const job::result result = job::wait();
+    EXPECT_EQ(ctx->hl != nullptr ? ctx->hl->hl_param : 20, 20);
+    if (ctx->onset != nullptr) {
+        EXPECT_EQ(ctx->onset->max_beats, max_beats);
+        EXPECT_EQ(ctx->onset->beat_param2, 5);
+    }
     EXPECT_EQ(tavo_has_audio(ctx), 1);
     // The nearest periods of whole frames are 21 and 22, 123 and 117 BPM.
     EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);
