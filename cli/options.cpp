@@ -27,7 +27,7 @@ constexpr const char *kFooter =
     "standard output in the order of the inputs, messages to standard error.\n"
     "\n"
     "The start of a highlight is exact to 0.4 s where the loud passage is louder than about\n"
-    "-14 dBFS RMS; elsewhere it is a point of a 2 s grid, usually 2 to 6 s early, and the text\n"
+    "-13 dBFS RMS; elsewhere it is a point of a 2 s grid, usually 2 to 6 s early, and the text\n"
     "says \"about\". In mode both the tempo is that of the music from the highlight on.\n"
     "\n"
     "Exit status: 0 all done; 1 a file failed; 2 wrong usage; 130 stopped with Ctrl-C.\n"
