@@ -1,0 +1,226 @@
+// Every call of memory, threads, locks and files fails in its turn, once and from there on for
+// ever: nothing crashes, hangs or leaks, and each job that was started calls back once. Every place
+// of a WAV job in every mode is tried, and some in the other formats; all with TAVO_FAULTS=all.
+// Leaks are LeakSanitizer's to find.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <csignal>
+#include <cstring>
+#include <filesystem>
+
+#include "tests/support/fault_layer.h"
+#include "tests/support/job_harness.h"
+
+namespace {
+
+using fault::plan;
+
+// Some kinds of calls that fail together. unharmed: the result is the undisturbed one all the same.
+struct group {
+    const char *name;
+    uint32_t calls;
+    bool unharmed;
+};
+constexpr group kGroups[] = {
+    {"memory", fault::kMemory, false},
+    {"thread", fault::kThread, true},
+    {"mutex", fault::kMutex, false},
+    {"condition", fault::kCondition, false},
+    {"open", fault::kOpen, false},
+    {"read", fault::kRead, false},
+    {"seek", fault::kSeek, false},
+    {"close", fault::kClose, true},
+    {"click", fault::kFopen | fault::kFwrite, true},
+};
+constexpr int kOpenedOnly = -1;
+constexpr int kDecodedTwice = 3;  // mode 2 when the landing point is not found
+
+// What a run came to.
+struct outcome {
+    int32_t created = 99, started = 0, released = 0, state = 0;
+    int32_t early = 0;  // calls that failed before the job
+    double song_ms = 0.0;
+    job::result result;
+    int64_t met = 0, refused = 0;
+};
+
+char current[256];  // the run that a crash or a hang interrupts
+
+void tell(int) {
+    (void)!write(STDERR_FILENO, current, strlen(current));
+    _exit(3);
+}
+
+int64_t descriptors() {
+    const std::filesystem::directory_iterator all("/proc/self/fd");
+    return std::distance(begin(all), end(all));
+}
+
+outcome run(const std::string &path, int mode, const plan &by) {
+    static const std::string click = testing::TempDir() + "tavo_click_" + std::to_string(getpid());
+    outcome out;
+    alarm(60);
+    fault::arm(by);
+    TAVO_CTX *ctx = job::create(path, std::clamp(mode, 0, 2), &out.created);
+    if (ctx != nullptr) {
+        out.early = static_cast<int32_t>(fault::refused());
+        out.song_ms = static_cast<double>(ctx->duration) / kUnitsPerMs;
+        fnamedec = click.c_str();
+        if (mode == kDecodedTwice) fault::hide_landing();
+        out.started = mode == kOpenedOnly ? 0 : tavo_analyze(ctx, 0, 0, 0);
+        out.refused = fault::refused();
+        if (out.started != 0) fault::disarm();
+        if (out.started != 0 && tavo_analyze(ctx, 0, 0, 0) != 0)
+            out.started = 99;  // it stays ready
+        if (mode != kOpenedOnly) job::wait();
+        out.state = load_flag(&ctx->state);
+        out.released = tavo_deinit(ctx);
+    }
+    out.met = fault::met();
+    out.refused = std::max(out.refused, fault::refused());
+    fault::disarm();
+    alarm(0);
+    unlink(click.c_str());
+    out.result = job::last;
+    return out;
+}
+
+// Null when the report is as the mode and its own status say.
+const char *flaw_of(const job::result &found, int mode, double song_ms) {
+    const bool beats = found.status == 0 && mode != TAVO_MODE_HIGHLIGHT;
+    if (found.calls != 1) return "callbacks";
+    if (found.hl_pos < 0 || found.hl_pos > song_ms) return "highlight";
+    if (found.status != 0 && (found.status != -1 || mode == TAVO_MODE_HIGHLIGHT)) return "status";
+    if (beats != (found.beat_count > 0) || beats == found.null_beats) return "beats";
+    const auto &list = found.beats;
+    const bool ordered = std::is_sorted(list.begin(), list.end());
+    const bool inside = list.empty() || (list.front() >= static_cast<float>(found.hl_pos) &&
+                                         list.back() <= song_ms);
+    return ordered && inside ? nullptr : "times of the beats";
+}
+
+const char *flaw_of(const outcome &found, int mode, const group &kind, const plan &by,
+                    const outcome &undisturbed) {
+    if (found.created != 0) {
+        const bool first =
+            (kind.calls & fault::kMemory) != 0 && by.place < (mode >= 2 ? 4 : 3);  // records
+        if (found.result.calls != 0) return "callback without a job";
+        if (kind.unharmed || by.error == EINTR) return "refused";
+        return found.created == (first ? TAVO_ERR_MEMORY : TAVO_ERR_HANDLE) ? nullptr
+                                                                            : "code of tavo_init";
+    }
+    if (found.released != 0) return "code of tavo_deinit";
+    if (mode == kOpenedOnly) return nullptr;
+    const bool no_job = kind.calls == fault::kThread && by.place == 0;
+    if (found.started != (no_job ? TAVO_ERR_MEMORY : 0)) return "code of tavo_analyze";
+    if (found.state != (found.result.status == 0 ? kStateFinished : kStateFailed)) return "state";
+    // What was met while opening is reported there or does no harm.
+    const bool unharmed = kind.unharmed || by.error == EINTR || found.refused == found.early;
+    const job::result &a = found.result, &b = undisturbed.result;
+    if (unharmed && (a.status != b.status || a.hl_pos != b.hl_pos || a.beats != b.beats))
+        return "result";
+    return flaw_of(a, mode, found.song_ms);
+}
+
+bool all_places() {
+    const char *wanted = getenv("TAVO_FAULTS");
+    return wanted != nullptr && strcmp(wanted, "all") == 0;
+}
+
+// Fails count of the places of this job, spread evenly; all of them when there are no more.
+void try_places(const std::string &path, int mode, const group &kind, int64_t count, plan by = {}) {
+    by.calls = kind.calls;
+    const outcome undisturbed = run(path, mode, by);
+    ASSERT_EQ(undisturbed.created, 0) << path;
+    ASSERT_EQ(undisturbed.result.status, mode == kOpenedOnly ? -2 : 0) << path;
+    ASSERT_EQ(undisturbed.result.hl_pos > 0, mode == TAVO_MODE_HIGHLIGHT || mode >= 2) << path;
+    const int64_t step = all_places() ? 1 : std::max<int64_t>(1, undisturbed.met / count);
+    int64_t struck = 0;
+    for (by.place = 0; by.place < undisturbed.met; by.place += step) {
+        for (const bool forever : {false, true}) {
+            by.forever = forever && by.error != EINTR;
+            snprintf(current, sizeof current, "interrupted: %s, mode %d, %s %d%s\n", path.c_str(),
+                     mode, kind.name, static_cast<int>(by.place), by.forever ? " and on" : "");
+            const int64_t before = descriptors();
+            const outcome found = run(path, mode, by);
+            struck += found.refused > 0 ? 1 : 0;
+            const char *flaw = flaw_of(found, mode, kind, by, undisturbed);
+            EXPECT_EQ(flaw, nullptr) << flaw << "; " << current;
+            EXPECT_EQ(descriptors(), before) << current;
+        }
+    }
+    EXPECT_GT(struck, 0) << path << ' ' << kind.name;
+}
+
+std::string song(const std::string &name, const std::string &format) {
+    return std::string(SHORT_SONGS) + "/" + name + "." + format;
+}
+
+class Faults : public testing::TestWithParam<std::tuple<std::string, int>> {
+ protected:
+    void SetUp() override {
+        for (const int number : {SIGALRM, SIGSEGV, SIGABRT}) signal(number, tell);
+    }
+    const std::string format = std::get<0>(GetParam());
+    const int mode = std::get<1>(GetParam());
+    const int64_t count = format == "wav" && EVERY_WAV_PLACE ? INT64_MAX : FAULT_SAMPLE;
+};
+
+TEST_P(Faults, AtEveryPlace) {
+    for (const group &kind : kGroups) {
+        if (mode == kOpenedOnly && (kind.unharmed || kind.calls == fault::kMutex)) continue;
+        const char *name = mode == kOpenedOnly       ? "many"
+                           : mode == TAVO_MODE_BEATS ? "short"
+                                                     : "long";
+        if (kind.calls != (fault::kFopen | fault::kFwrite) || mode >= 1)
+            try_places(song(name, format), mode, kind, count);
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Jobs, Faults,
+                         testing::Combine(testing::Values("wav", "m4a", "flac", "mp3", "aac",
+                                                          "ogg"),
+                                          testing::Values(kOpenedOnly, 0, 1, 2, kDecodedTwice)));
+
+// A signal interrupts a read: nothing may change.
+TEST(FaultsOfFiles, InterruptedReads) {
+    plan by;
+    by.error = EINTR;
+    for (const char *format : {"wav", "mp3"})
+        try_places(song("short", format), 1, {"interrupted", fault::kRead, true}, 20, by);
+}
+
+// A path that stands for a descriptor, which every source duplicates. Duplicates share one offset:
+// a song that is decoded in one part is read by one of them at a time.
+TEST(FaultsOfFiles, Duplicates) {
+    const int input = dup(STDIN_FILENO);
+    const int file = open(song("brief", "flac").c_str(), O_RDONLY);
+    ASSERT_EQ(dup2(file, STDIN_FILENO), STDIN_FILENO);
+    close(file);
+    try_places("fd", TAVO_MODE_BEATS, {"dup", fault::kDup, false}, INT64_MAX);
+    dup2(input, STDIN_FILENO);
+    close(input);
+}
+
+// A stop whose watcher cannot be started waits for the job by itself.
+TEST(FaultsOfThreads, StopWithoutWatcher) {
+    for (int i = 0; i < 30; ++i) {
+        plan by;
+        by.calls = fault::kThread;
+        by.place = 1;
+        by.forever = true;
+        fault::arm(by);
+        TAVO_CTX *ctx = job::create(song("short", "ogg"), i % 3);
+        ASSERT_NE(ctx, nullptr);
+        ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+        EXPECT_EQ(tavo_deinit(ctx), 0);
+        EXPECT_GT(fault::refused(), 0);
+        EXPECT_EQ(job::last.calls, 1);
+        fault::disarm();
+    }
+}
+
+}  // namespace

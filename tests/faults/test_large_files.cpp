@@ -1,0 +1,57 @@
+// WAV files beyond 2 and 4 GiB, nearly all of them holes: positions and lengths of more than 31 and
+// 32 bits. Their jobs, which read all of it, run with TAVO_FAULTS=all and take 10 GiB of memory.
+#include <fcntl.h>
+
+#include "tests/desktop/codec_test.h"
+#include "tests/support/job_harness.h"
+#include "tests/support/song.h"
+
+namespace {
+
+constexpr int64_t kGiB = int64_t{1} << 30;
+constexpr int64_t kRate = 48'000;
+
+// Its last second has samples of 1000. The sizes in the header saturate.
+std::string sparse_wav(int32_t channels, int64_t seconds) {
+    support::wav_spec plan;
+    plan.rate = static_cast<int32_t>(kRate);
+    plan.channels = channels;
+    const auto second = static_cast<size_t>(kRate * channels);
+    codec_test::bytes file = support::wav_bytes(std::vector<int16_t>(second, 1000), plan);
+    constexpr size_t kHead = 44;
+    const int64_t data = seconds * 2 * static_cast<int64_t>(second);
+    for (size_t i = 0; i < 4; ++i) {
+        file[40 + i] = static_cast<uint8_t>(std::min<int64_t>(data, 0xFFFFFFFF) >> 8 * i);
+    }
+    const std::string path = codec_test::save("sparse.wav", {file.begin(), file.begin() + kHead});
+    const int fd = open(path.c_str(), O_WRONLY);
+    const auto size = static_cast<ssize_t>(2 * second);
+    EXPECT_EQ(pwrite(fd, file.data() + kHead, 2 * second, kHead + data - size), size);
+    close(fd);
+    return path;
+}
+
+TEST(LargeFiles, Beyond2And4GiB) {
+    constexpr int64_t kUnits = codec_test::kUnits;
+    for (const int64_t gib : {2, 4}) {
+        const int64_t seconds = gib * kGiB / (kRate * 8 * 2) + 2;
+        const std::string path = sparse_wav(8, seconds);
+        const codec_test::opened file(path);
+        ASSERT_NE(file.source, nullptr) << file.error;
+        EXPECT_EQ(file.format.duration, seconds * kUnits);
+        int64_t reached = -1;
+        ASSERT_EQ(mtsrc_seekstream(file.source, (seconds - 1) * kUnits, &reached), 0);
+        EXPECT_EQ(reached, (seconds - 1) * kUnits);
+        EXPECT_EQ(codec_test::read(file.source, SIZE_MAX), codec_test::samples(kRate, 1000));
+        TAVO_CTX *ctx = job::create(path, TAVO_MODE_HIGHLIGHT);
+        ASSERT_NE(ctx, nullptr);
+        EXPECT_EQ(ctx->duration, seconds * kUnits);
+        if (getenv("TAVO_FAULTS") != nullptr) {
+            EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), TAVO_OK);
+            EXPECT_EQ(job::wait().status, 0);
+        }
+        EXPECT_EQ(tavo_deinit(ctx), TAVO_OK);
+    }
+}
+
+}  // namespace
