@@ -1,0 +1,143 @@
+// An instance whose decoding the library has planned, for a stream that the scripted codec library
+// describes and whose bytes the test plays.
+#ifndef TAVO_TESTS_PCM_SONG_PLAN_H
+#define TAVO_TESTS_PCM_SONG_PLAN_H
+
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstring>
+#include <fstream>
+#include <map>
+#include <random>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "media_source/mtsrc_ctx.h"
+#include "pcm/decode.h"
+#include "tests/support/scripted_codec.h"
+
+using byte_run = std::vector<uint8_t>;
+using sample_run = std::vector<int16_t>;
+
+// Bytes among which no 200 in a row occur twice.
+inline byte_run noise(int64_t bytes, uint32_t seed) {
+    byte_run run(static_cast<size_t>(bytes));
+    std::mt19937 random(seed);
+    for (auto &value : run) value = static_cast<uint8_t>(random() >> 11);
+    return run;
+}
+
+inline byte_run slice(const byte_run &run, int64_t first, int64_t end) {
+    return {run.begin() + first, run.begin() + end};
+}
+
+inline byte_run operator+(byte_run left, const byte_run &right) {
+    left.insert(left.end(), right.begin(), right.end());
+    return left;
+}
+
+inline sample_run samples_of(const byte_run &bytes) {
+    sample_run samples(bytes.size() / 2);
+    if (!samples.empty()) memcpy(samples.data(), bytes.data(), samples.size() * 2);
+    return samples;
+}
+
+// What a source plays once it is planned, and what it saw.
+struct player {
+    byte_run stream = {};
+    int64_t at = 0;           // next byte
+    int64_t warm = 0;         // bytes still to be falsified, as after a seek into mid-stream
+    int64_t fail_at = -1;     // byte from which on reads fail
+    int empty_replies = 0;    // reads that bring nothing before the others do
+    int32_t code = 0;         // of a read within the stream
+    int64_t land = -1;        // byte where the next seek lands, whatever it is asked
+    int64_t report = -1;      // units that the next seek reports, whatever it is asked
+    bool seek_fails = false;  // the next one, without a report
+    std::vector<int64_t> seeks = {};
+    int32_t most_wanted = 0;
+};
+inline std::map<const mtsrc_ctx *, player *> players;
+
+inline int32_t play(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
+    player *self = players.at(src);
+    self->most_wanted = std::max(self->most_wanted, want);
+    frame->size = want;
+    if (self->fail_at >= 0 && self->at + want > self->fail_at) return TAVO_ERR_READ;
+    const bool empty = self->empty_replies > 0 && self->empty_replies-- > 0;
+    const int64_t left = static_cast<int64_t>(self->stream.size()) - self->at;
+    const int64_t bytes = empty ? 0 : std::clamp<int64_t>(left, 0, want);
+    auto *out = static_cast<uint8_t *>(frame->data);
+    std::copy_n(self->stream.begin() + (bytes > 0 ? self->at : 0), bytes, out);
+    for (int64_t i = 0; i < bytes && self->warm > 0; ++i, --self->warm) out[i] ^= 0x55;
+    self->at += bytes;
+    frame->size = static_cast<int32_t>(bytes);
+    return bytes < want && !empty ? 1 : self->code;
+}
+
+inline int32_t move_player(mtsrc_ctx *src, int64_t position, int64_t *reached) {
+    player *self = players.at(src);
+    self->seeks.push_back(position);
+    if (std::exchange(self->seek_fails, false)) return TAVO_ERR_HANDLE;
+    const int64_t land = std::exchange(self->land, -1);
+    const int64_t report = std::exchange(self->report, -1);
+    self->at = land >= 0 ? land : position * src->format.sample_rate / kUnitsPerSecond * 2;
+    *reached = report >= 0 ? report : position;
+    return 0;
+}
+
+class song_plan : public testing::Test {
+ protected:
+    song_plan() { scripted::reset(); }
+    ~song_plan() override {
+        release();
+        remove(path.c_str());
+    }
+    void release() {
+        free(ctx.ana);
+        tavo_decode_deinit(&ctx);
+        ctx = {};
+        players.clear();
+        EXPECT_TRUE(ext_mutex_mt == nullptr && ext_cond_mt == nullptr);
+        EXPECT_EQ(scripted::live_objects(), 0);
+        EXPECT_TRUE(scripted::faults().empty());
+    }
+    // The code of tavo_decode_init. The sources play stream from where setup moved them.
+    int32_t plan(int64_t duration, int32_t rate, const byte_run &stream = {}) {
+        release();
+        std::ofstream(path) << head;
+        script.channels = 1;
+        script.duration = duration;
+        script.sample_rate = rate;
+        scripted::use(script);
+        const TAVO_PARAM param = {path.c_str(), 0};
+        const int32_t code = tavo_decode_init(&ctx, &param);
+        for (int32_t i = 0; code == 0 && i < ctx.seg_count; ++i) {
+            const TAVO_DECSEG &seg = ctx.seg[i];
+            sources[i] = {stream, seg.start * rate / kUnitsPerSecond * 2};
+            players[seg.src] = &sources[i];
+            seg.src->get_frm = play;
+            seg.src->seek = move_player;
+        }
+        return code;
+    }
+    byte_run pcm(int64_t bytes) {
+        const auto *first = reinterpret_cast<const uint8_t *>(ctx.pcm);
+        return {first, first + bytes};
+    }
+    // As the caller of construct_decbuf has to.
+    void drop_buffers() {
+        for (int32_t i = 0; i < ctx.seg_count; ++i) free(std::exchange(ctx.seg[i].buf, nullptr));
+        free(std::exchange(ctx.pcm, nullptr));
+    }
+
+    std::string path = testing::TempDir() + "tavo_pcm_" + std::to_string(getpid());
+    std::string head = "fLaC and some more";  // what recognition reads
+    scripted::script script;
+    player sources[4];
+    TAVO_CTX ctx = {};
+};
+
+#endif
