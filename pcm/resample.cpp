@@ -65,17 +65,16 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
     return ready ? 0 : TAVO_ERR_MEMORY;
 }
 
-// out may be the memory of in where fits_in_place says so.
+// out may be the memory of in where works_in_place says so.
 int32_t run_conversion(const conversion &plan, const int16_t *in, double *out) {
     return whole_ratio(plan.ratio) != 0 ? run_blocks(plan, in, out) : run_sinc(plan, in, out);
 }
 
-// Whether the output fits in the memory of the input and is written there behind what is still to
-// be read: the interpolator has read all of its input by then.
-bool fits_in_place(const conversion &plan) {
+// Whether out may be the memory of in: the interpolator has read all of its input before it writes
+// there, and blocks of four samples take the room of one output.
+bool works_in_place(const conversion &plan) {
     const int32_t whole = whole_ratio(plan.ratio);
-    if (whole != 0) return whole == kMaxWholeRatio && plan.n <= exact_blocks(whole);
-    return plan.size - kBytesBehind <= plan.count * kBytesPerSample;
+    return whole == 0 || (whole == kMaxWholeRatio && plan.n <= exact_blocks(whole));
 }
 
 // The conversion in the memory of pcm. Null, with pcm as it was, when it cannot be had; else the
@@ -85,6 +84,7 @@ double *convert_in_place(const conversion &plan, int16_t *pcm, int32_t *err) {
     void *memory = pcm;
     if (plan.size > bytes) memory = realloc(memory, static_cast<size_t>(plan.size));
     if (memory == nullptr) return nullptr;
+    advise_huge_pages(memory, plan.size);
     auto *out = static_cast<double *>(memory);
     *err = run_conversion(plan, static_cast<const int16_t *>(memory), out);
     memset(out + plan.n, 0, kBytesBehind);
@@ -131,7 +131,7 @@ int32_t convert_song(TAVO_CTX *ctx, int64_t off) {
     int32_t err = 0;
     conversion plan = {};
     if (pcm != nullptr && plan_conversion(bytes, rate, ctx->ana_rate, &plan) && plan.n > 0 &&
-        fits_in_place(plan)) {
+        works_in_place(plan)) {
         ctx->ana = convert_in_place(plan, pcm, &err);
     }
     if (ctx->ana == nullptr) {

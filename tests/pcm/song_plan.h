@@ -129,8 +129,8 @@ class song_plan : public testing::Test {
     }
     // As the caller of construct_decbuf has to.
     void drop_buffers() {
-        for (int32_t i = 0; i < ctx.seg_count; ++i) free(std::exchange(ctx.seg[i].buf, nullptr));
-        free(std::exchange(ctx.pcm, nullptr));
+        for (int32_t i = 0; i < ctx.seg_count; ++i) free(ctx.seg[i].buf);
+        free(ctx.pcm);
     }
 
     std::string path = testing::TempDir() + "tavo_pcm_" + std::to_string(getpid());

@@ -284,6 +284,25 @@ TEST(resample_run, song_becomes_the_same_signal) {
     }
 }
 
+// Where single precision rounds the places, a block may be elsewhere than its output.
+TEST(resample_run, song_too_long_for_its_own_memory) {
+    constexpr int64_t kOutputs = (1 << 24) + 8;
+    TAVO_CTX ctx = {};
+    ctx.pcm_bytes = kOutputs * 8;
+    ctx.pcm = static_cast<int16_t *>(calloc(kOutputs, 8));
+    for (int16_t i = 0; i < 80; ++i) ctx.pcm[kOutputs * 4 - 80 + i] = i;
+    ctx.fmt.sample_rate = 44100;
+    ctx.ana_rate = kAnalysisRate;
+    int64_t n = 0;
+    double *out = nullptr;
+    EXPECT_EQ(dorn_resampler_run(ctx.pcm, ctx.pcm_bytes, 44100, kAnalysisRate, &n, &out), 0);
+    const signal want(out + n - 20, out + n);
+    free(out);
+    EXPECT_EQ(convert_song(&ctx, 0), 0);
+    EXPECT_EQ(signal(ctx.ana + n - 20, ctx.ana + n), want);
+    free(ctx.ana);
+}
+
 using resample_faults = song_plan;
 
 TEST_F(resample_faults, each_allocation_fails_in_turn) {
@@ -295,8 +314,8 @@ TEST_F(resample_faults, each_allocation_fails_in_turn) {
         {48000, false, "eee..."},  // output, state, 16-bit samples
         {44100, false, "eeess."},  // output, lock, condition; without parts or flags silence
         {48000, true, "ee...."},   // state, 16-bit samples; memory not taken back is no error
-        {44100, true, ".eess."},   // memory that cannot grow: the output has its own
-        {22050, true, "eeess."},
+        {8000, true, ".ee..."},    // memory that cannot grow: the output has its own
+        {44100, true, ".eess."},  {22050, true, "eeess."},
     };
     for (const auto &each : cases) {
         for (size_t nth = 1; nth <= 6; ++nth) {
