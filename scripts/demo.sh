@@ -25,12 +25,15 @@ quietly cmake --preset release -DTAVO_BUILD_TESTS=OFF -DTAVO_BUILD_JNI=OFF
 quietly cmake --build --preset release --target tavo_command
 bin=build/release/bin
 
+quiet=
 if [[ -z $file ]]; then
   file=build/release/sample.wav
-  echo "Making a sample song:"
+  quiet=build/release/quiet.wav
+  echo "Making a sample song, and the same 12 dB softer:"
   quietly g++ -std=c++17 -O2 -I. -o build/make_song \
     tests/support/make_song.cpp tests/support/song.cpp tests/support/song_wav.cpp
   build/make_song "$file" --seconds 90 --bpm 120 --loud-at 30
+  build/make_song "$quiet" --seconds 90 --bpm 120 --loud-at 30 --level 0.25
 fi
 
 show() {
@@ -41,16 +44,17 @@ show() {
   "$bin/tavo" "$@"
 }
 status=0
-{ show --mode highlight -- "$file" && show -- "$file"; } || status=$?
+{ show --mode highlight -- "$file" ${quiet:+"$quiet"} && show -- "$file"; } || status=$?
 if [[ $status -eq 0 ]]; then
   cat <<'END'
 
 stream     what the file holds: its length, sample rate and channels
-highlight  where the song's strongest loud passage starts. The second run looks for beats from there
-           on: it starts where a seek to the highlight lands, in WAV at a whole second
+highlight  where the song's strongest loud passage starts: exact to 0.4 s where the music is loud; in
+           quiet music "about", a point of a 2 s grid, usually 2 to 6 s early. The last run takes the
+           place where a seek to the highlight lands, in WAV a whole second
 tempo      beats a minute, to the nearest step of the analysis (117, 123, ...)
-beats      good places for a cut, at least about a second apart: how many, the first and the last;
-           --format json, csv or labels lists them all
+beats      good places for a cut, at least 1 s apart, at least 3 s where the tempo is 95 or less: how
+           many, the first and the last; --format json, csv or labels lists them all
 END
 fi
 exit "$status"

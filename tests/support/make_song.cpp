@@ -1,7 +1,8 @@
 // make_song OUT.wav [--seconds S] [--bpm B] [--rate HZ] [--channels N] [--seed N] [--loud-at S]
-//           [--accents]
-// Writes a synthetic song and prints where its loud section starts. --accents: every fourth hit is
-// far stronger than the others, so that no small change of the signal chooses other beats.
+//           [--level L] [--accents]
+// Writes a synthetic song and prints where its loud section starts. --level: 1 unless given, 0.25
+// is 12 dB softer. --accents: every fourth hit is far stronger than the others, so that no small
+// change of the signal chooses other beats.
 #include <algorithm>
 #include <cmath>
 #include <cstdio>
@@ -15,7 +16,7 @@ namespace {
 
 constexpr const char *kUsage =
     "usage: make_song OUT.wav [--seconds S] [--bpm B] [--rate HZ] [--channels N] [--seed N]\n"
-    "                 [--loud-at S] [--accents]\n";
+    "                 [--loud-at S] [--level L] [--accents]\n";
 
 bool usable(const support::song_spec &plan) {
     return plan.seconds > 0.0 && plan.seconds <= 7200.0 && plan.bpm >= 1.0 && plan.rate >= 1000 &&
@@ -41,9 +42,13 @@ support::song accented(support::song_spec plan) {
 
 int main(int argc, char **argv) {
     support::song_spec plan;
-    std::map<std::string, double> options = {
-        {"--seconds", plan.seconds},   {"--bpm", plan.bpm},   {"--rate", plan.rate},
-        {"--channels", plan.channels}, {"--seed", plan.seed}, {"--loud-at", NAN}};
+    std::map<std::string, double> options = {{"--seconds", plan.seconds},
+                                             {"--bpm", plan.bpm},
+                                             {"--rate", plan.rate},
+                                             {"--channels", plan.channels},
+                                             {"--seed", plan.seed},
+                                             {"--loud-at", NAN},
+                                             {"--level", 1.0}};
     const char *path = nullptr;
     bool good = true;
     bool accents = false;
@@ -68,6 +73,8 @@ int main(int argc, char **argv) {
     plan.loud_at =
         std::isnan(options.at("--loud-at")) ? plan.seconds / 3.0 : options.at("--loud-at");
     plan.tail_at = plan.seconds * 5.0 / 6.0;
+    plan.drum_level *= options.at("--level");
+    plan.bed_level *= options.at("--level");
     if (!good || path == nullptr || !usable(plan)) {
         fputs(kUsage, stderr);
         return 2;
