@@ -2,7 +2,6 @@
 
 #include "beat/beats.h"
 #include "highlight/position.h"
-#include "pcm/from_highlight.h"
 #include "pcm/song.h"
 
 namespace {
@@ -72,7 +71,7 @@ extern "C" void *analyzeOnsetFromeHi(void *arg) {
     auto *ctx = static_cast<TAVO_CTX *>(arg);
     decode_song(ctx);
     const int64_t start_ms = getHLPosition(ctx);
-    const int32_t code = tavo_get_from_here(ctx, start_ms);
+    const int32_t code = start_song_at(ctx, start_ms);
     find_and_report_beats(ctx, true, code == 0);
     pthread_exit(nullptr);
 }

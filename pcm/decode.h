@@ -1,9 +1,11 @@
 // Stage 2: the file becomes one buffer of 16-bit mono PCM at the stream's own rate.
 //
-// In: a path. Out: TAVO_CTX.pcm, pcm_bytes bytes. The stream is cut into 1 or 4 segments, each with
-// a media source, a buffer and a thread of its own; all but the last decode two seconds more than
-// their share, and the seams are laid where the overlaps hold the same bytes. Before:
-// media_source/mtsrc.h. After: highlight/position.h, pcm/resample.h.
+// In: a path. Out: TAVO_CTX.pcm, pcm_bytes bytes. Before: media_source/mtsrc.h. After:
+// highlight/position.h, pcm/resample.h. Jobs call pcm/song.h, which holds less memory.
+//
+// The stream is cut into 1 or 4 segments, each with a media source, a buffer and a thread of its
+// own. All but the last decode two seconds more than their share, and they are stitched where the
+// overlaps hold the same bytes.
 #ifndef TAVO_PCM_DECODE_H
 #define TAVO_PCM_DECODE_H
 
@@ -47,13 +49,13 @@ int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param);
 // Safe on a partly built setup and when called twice.
 void tavo_decode_deinit(TAVO_CTX *ctx);
 
-// Plans anew for the stream from start (100-ns units) to its end, with the sources already open,
-// and allocates new segment buffers and a new pcm. The old ones must have been freed. Returns 0; -2
+// Plans again for the stream from start (100-ns units) to its end, with the sources that are open,
+// and allocates new segment buffers and a new pcm. The caller has freed the old ones. Returns 0; -2
 // out of memory or nothing left, with the segment buffers freed.
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
 
-// Decodes every planned segment in parallel and stitches them into dst (dst_capacity bytes).
-// Returns the bytes written, 0 when any segment gave nothing.
+// Decodes the planned segments in parallel and stitches them into dst (dst_capacity bytes); their
+// buffers stay allocated. Returns the bytes written, 0 when any segment gave nothing.
 int64_t DecodePcmMT(TAVO_CTX *ctx, void *dst, int64_t dst_capacity);
 
 // Thread entry of one segment, and its completion handler. The argument is the TAVO_DECSEG.

@@ -60,7 +60,7 @@ int32_t place_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_l
     if (seg->buf == nullptr) return TAVO_ERR_MEMORY;
     advise_huge_pages(seg->buf, seg->cap);
 
-    seg->seek_pos = start;  // stands when the seek fails without reporting a position
+    seg->seek_pos = start;  // kept when the seek fails without reporting a position
     mtsrc_seekstream(seg->src, start, &seg->seek_pos);
     return 0;
 }
@@ -149,13 +149,14 @@ int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start) {
     ctx->pcm = nullptr;
     ctx->pcm_bytes = 0;
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
-    // The caller has freed the buffers: nothing that fails below may leave them to a release.
+    // The caller has freed the buffers. Their pointers go before anything can fail, so that no
+    // release frees them again.
     const int32_t records = table_size(ctx);
     for (int32_t i = 0; i < records; ++i) ctx->seg[i].buf = nullptr;
 
     int64_t rest = 0;
     if (__builtin_sub_overflow(ctx->duration, start, &rest) || rest < 0) return TAVO_ERR_MEMORY;
-    // A start before the stream's own must not ask for more records than there are.
+    // With a start below 0 the rest may ask for more segments than the table has records.
     ctx->seg_count = std::min(segments_for(rest), records);
     const int64_t seg_len = rest / ctx->seg_count;
     int32_t err = 0;

@@ -65,20 +65,26 @@ int64_t planned_bytes(const TAVO_DECSEG *seg) {
     return span_bytes(units, seg->fmt.sample_rate, &bytes) ? bytes : 0;
 }
 
-// Discards the decoding and decodes the stream again from start (100-ns units).
-int32_t decode_again(TAVO_CTX *ctx, int64_t start) {
+// Discards the decoding and decodes the stream again from start (100-ns units). keep: whether the
+// segments' buffers stay allocated.
+int32_t decode_again(TAVO_CTX *ctx, int64_t start, bool keep) {
     for (int32_t i = 0; i < ctx->seg_count; ++i) free_segment_buffer(&ctx->seg[i]);
     free(ctx->pcm);
     ctx->pcm = nullptr;
 
     const int32_t err = construct_decbuf(ctx, start);
-    if (err == 0) decode_song(ctx);
-    return err;
+    if (err != 0) return err;
+    if (keep) {
+        ctx->pcm_bytes = DecodePcmMT(ctx, ctx->pcm, ctx->pcm_bytes);
+    } else {
+        decode_song(ctx);
+    }
+    return 0;
 }
 
 // Seeks to pos (milliseconds), stores the landing point as the highlight and finds it in the
 // decoded PCM, or decodes from there. *off: bytes of pcm before the landing point.
-int32_t settle_start(TAVO_CTX *ctx, int64_t pos, int64_t *off) {
+int32_t settle_start(TAVO_CTX *ctx, int64_t pos, bool keep, int64_t *off) {
     mtsrc_ctx *src = ctx->seg[0].src;
     const int32_t rate = ctx->fmt.sample_rate;
     int64_t reached = 0;
@@ -93,7 +99,18 @@ int32_t settle_start(TAVO_CTX *ctx, int64_t pos, int64_t *off) {
     if (find_landing(src, rate, ctx->pcm, ctx->pcm_bytes, off) == 0) return 0;
 
     *off = 0;
-    return decode_again(ctx, reached);
+    return decode_again(ctx, reached, keep);
+}
+
+int32_t start_at(TAVO_CTX *ctx, int64_t pos, bool keep) {
+    int64_t off = 0;
+    int32_t err = 0;
+    if (pos < kFirstSeekMs) {
+        ctx->hl->hl_pos = 0;
+    } else {
+        err = settle_start(ctx, pos, keep, &off);
+    }
+    return err == 0 ? convert_song(ctx, off) : err;
 }
 
 }  // namespace
@@ -103,12 +120,9 @@ int32_t _compare_decoded(TAVO_DECSEG *seg, const int16_t *pcm, int64_t *off) {
 }
 
 int32_t tavo_get_from_here(TAVO_CTX *ctx, int64_t pos) {
-    int64_t off = 0;
-    int32_t err = 0;
-    if (pos < kFirstSeekMs) {
-        ctx->hl->hl_pos = 0;
-    } else {
-        err = settle_start(ctx, pos, &off);
-    }
-    return err == 0 ? convert_song(ctx, off) : err;
+    return start_at(ctx, pos, true);
+}
+
+int32_t start_song_at(TAVO_CTX *ctx, int64_t pos) {
+    return start_at(ctx, pos, false);
 }

@@ -11,12 +11,15 @@
 
 extern "C" {
 
-// pos: milliseconds. Returns 0; -2 when the second decoding cannot be planned; the conversion's
-// code.
+// pos: milliseconds. Returns 0; -2 when the second decoding cannot be planned; else the
+// conversion's code. Of the segments it needs the source of the first, and all of them to decode
+// again.
 int32_t tavo_get_from_here(TAVO_CTX *ctx, int64_t pos);
 
 // Looks in pcm for the audio that the segment's source delivers next. *off: bytes, in the expected
-// offset of that audio, out the offset found. Returns 0 found, -1 not (*off unchanged).
+// offset of that audio, out the offset found. Of the record it reads src, fmt, start and duration;
+// the last two tell the size of pcm, which a duration of 0 leaves unknown. Returns 0 found, -1 not,
+// with *off unchanged.
 int32_t _compare_decoded(TAVO_DECSEG *seg, const int16_t *pcm, int64_t *off);
 }
 

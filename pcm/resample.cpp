@@ -53,7 +53,7 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
     if (ready) {
         advise_huge_pages(narrow, plan.n * kBytesPerSample);
         if (dorn_resampler_prepare(state, plan.source_rate, plan.ana_rate, 1) == 0) {
-            // The converter counts its input in 32 bits: what lies beyond (12 hours at 48 kHz)
+            // The converter counts its input in 32 bits. What lies beyond them, 12 hours at 48 kHz,
             // stays 0.
             const auto in_len = static_cast<int32_t>(std::min<int64_t>(plan.count, INT32_MAX));
             convert_frames(state, in, in_len, narrow, plan.n);
@@ -77,8 +77,8 @@ bool works_in_place(const conversion &plan) {
     return whole == 0 || (whole == kMaxWholeRatio && plan.n <= exact_blocks(whole));
 }
 
-// The conversion in the memory of pcm. Null, with pcm as it was, when it cannot be had; else the
-// output takes the memory over. *err: of the conversion.
+// Converts pcm in its own memory, which becomes the output's. Returns null, with pcm as it was,
+// when the memory cannot grow. *err: the code of the conversion.
 double *convert_in_place(const conversion &plan, int16_t *pcm, int32_t *err) {
     const int64_t bytes = plan.count * kBytesPerSample;
     void *memory = pcm;
@@ -123,7 +123,7 @@ int32_t convert_song(TAVO_CTX *ctx, int64_t off) {
     ctx->pcm = nullptr;
     ctx->ana = nullptr;
     ctx->ana_len = 0;
-    // Moved to the front: an odd offset holds no samples that could be read in their place.
+    // To the front of the memory, where samples can be read whatever the offset.
     if (off > 0 && bytes > 0) {
         memmove(pcm, reinterpret_cast<const uint8_t *>(pcm) + off, static_cast<size_t>(bytes));
     }

@@ -28,21 +28,21 @@ double block_mean(const int16_t *in, int64_t first, int64_t end) {
     return static_cast<double>(sum / static_cast<float>(end - first));
 }
 
-// Any blocks.
+// Blocks of any length.
 void average_blocks(const RESAMPLE_PART *part, int64_t first, int64_t end) {
     for (int64_t i = first; i < end; ++i) {
         const int64_t from = block_start(part->ratio, i, part->in_count);
         const int64_t to = block_start(part->ratio, i + 1, part->in_count);
         if (from < to) {
             part->out[i] = block_mean(part->in, from, to);
-        } else {  // rounding left no block: the sample there, or the last one
+        } else {  // rounding left the block empty: take the sample there, or the last one
             part->out[i] = part->in[std::min(from, part->in_count - 1)];
         }
     }
 }
 
-// Blocks of exactly kWhole samples. Their sums are exact in single precision and so are the same as
-// integers. out may be the memory of in when kWhole is 4: a step is read before it is written.
+// Blocks of exactly kWhole samples. Sums of so few are exact in single precision, so integers give
+// the same. out may be the memory of in when kWhole is 4: a step is read before it is written.
 template <int32_t kWhole>
 void average_whole(const int16_t *in, double *out, int64_t first, int64_t end) {
     constexpr int32_t kStep = 64;  // outputs

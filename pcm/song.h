@@ -1,8 +1,8 @@
-// The jobs' forms of stages 2 and 3: the bytes and samples of DecodePcmMT and dorn_resampler_run,
-// with each buffer given back, or used for its successor, as soon as nothing reads it any more.
+// The jobs' forms of stages 2 and 3. They give the bytes and samples of DecodePcmMT,
+// dorn_resampler_run and tavo_get_from_here, but free each buffer, or use it for its successor, as
+// soon as nothing reads it any more.
 //
-// In: a plan of pcm/decode.h. Out: TAVO_CTX.pcm, then ana. Called by core/jobs.cpp and
-// pcm/from_highlight.cpp.
+// In: a plan of pcm/decode.h. Out: TAVO_CTX.pcm, then ana. Called by core/jobs.cpp.
 #ifndef TAVO_PCM_SONG_H
 #define TAVO_PCM_SONG_H
 
@@ -13,6 +13,9 @@ extern "C" {
 // Decodes the plan into pcm, as large as pcm_bytes says, and sets pcm_bytes to the bytes decoded, 0
 // on failure. The segments' buffers are freed.
 void decode_song(TAVO_CTX *ctx);
+
+// tavo_get_from_here, which see; a second decoding leaves no segment buffers behind.
+int32_t start_song_at(TAVO_CTX *ctx, int64_t pos);
 
 // Converts pcm without its first off bytes into a new ana of ana_len samples at ana_rate. pcm is
 // freed and null in any case. Returns the codes of dorn_resampler_run.

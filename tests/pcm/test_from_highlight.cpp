@@ -2,6 +2,7 @@
 
 #include "pcm/from_highlight.h"
 #include "pcm/resample.h"
+#include "pcm/song.h"
 #include "tests/pcm/song_plan.h"
 
 namespace {
@@ -93,6 +94,7 @@ TEST_F(from_highlight, where_the_landing_point_is_found) {
         expect_from(each.ms + 1, slice(played, each.start, each.found ? each.bytes : kBytes),
                     each.ms);
         EXPECT_EQ(sources[0].seeks.size(), each.found ? 1U : 2U);
+        EXPECT_NE(ctx.seg[0].buf, nullptr);
     }
 }
 
@@ -103,6 +105,14 @@ TEST_F(from_highlight, pcm_of_the_caller_is_cut_without_decoding) {
     ctx.seg[0].duration = 0;
     expect_from(2500, slice(stream, 40'000, kBytes), 2500);
     EXPECT_EQ(sources[0].seeks.size(), 1U);
+}
+
+TEST_F(from_highlight, job_leaves_no_buffers) {
+    decode(stream);
+    sources[0].land = 0;  // out of range
+    EXPECT_EQ(start_song_at(&ctx, 15'000), 0);
+    EXPECT_EQ(ctx.ana_len, kBytes / 4 / 2 * kAnalysisRate / kRate);
+    for (int i = 0; i < 4; ++i) EXPECT_EQ(ctx.seg[i].buf, nullptr);
 }
 
 TEST_F(from_highlight, nothing_left_cannot_be_planned) {
