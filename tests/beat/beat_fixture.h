@@ -52,50 +52,27 @@ struct working_context {
     ~working_context() { __tavo_deinit(&beat); }
 };
 
-inline std::vector<double> noise(size_t n, double amplitude, uint32_t seed = 1) {
-    std::mt19937 random(seed);
-    std::vector<double> signal(n);
-    for (double &x : signal) x = amplitude * (static_cast<double>(random()) / 2147483648.0 - 1.0);
-    return signal;
+inline double uniform(std::mt19937 *random) {
+    return static_cast<double>((*random)()) / 2147483648.0 - 1.0;
 }
 
-// The samples at which the drum of drum_song is hit.
-inline std::vector<size_t> drum_hits(double bpm, double seconds) {
-    std::vector<size_t> hits;
-    for (double t = 0.25; t + 0.2 < seconds; t += 60.0 / bpm) {
-        hits.push_back(static_cast<size_t>(t * kAnalysisRate));
+// Between -1 and 1; or of any size up to 2^highest; or mostly, or but for its signs, nothing; or
+// too small to have its full precision.
+inline std::vector<double> wild_samples(size_t n, int highest, std::mt19937 *random) {
+    std::vector<double> samples(n);
+    const auto kind = (*random)() % 5;
+    for (double &x : samples) {
+        x = uniform(random);
+        if (kind == 1) x = std::ldexp(x, static_cast<int>((*random)() % 200) - 200 + highest);
+        if (kind == 2) x = (*random)() % 3 == 0 ? x : 0.0;
+        if (kind == 3) x = std::ldexp(x, -1074 + static_cast<int>((*random)() % 60));
+        if (kind == 4) x = (*random)() % 2 == 0 ? 0.0 : -0.0;
     }
-    return hits;
+    return samples;
 }
 
-// Struck bells, each heard until the next, no two equally loud. They fade ever more slowly and in
-// all bands alike, so that the envelope has its peaks at the hits alone.
-inline std::vector<double> drum_song(double bpm, double seconds) {
-    std::vector<double> song(static_cast<size_t>(seconds * kAnalysisRate));
-    std::vector<size_t> hits = drum_hits(bpm, seconds);
-    hits.push_back(song.size());
-    std::mt19937 random(4);
-    for (size_t k = 0; k + 1 < hits.size(); ++k) {
-        const double loudness = 1000.0 + 1000.0 * (static_cast<double>(random()) / 4294967296.0);
-        for (size_t i = hits[k]; i < hits[k + 1]; ++i) {
-            const double t = static_cast<double>(i - hits[k]) / kAnalysisRate;
-            double bell = 0.0;
-            for (double hz = 150.0; hz < 5500.0; hz += 250.0)
-                bell += cos(6.283185307179586 * hz * t);
-            song[i] = loudness * bell / (1.0 + t / 0.1);
-        }
-    }
-    return song;
-}
-
-// Ten seconds of a quiet drum, then fourteen of a loud one with hiss.
-inline std::vector<double> rising_song() {
-    std::vector<double> song = drum_song(120, 24);
-    const std::vector<double> hiss = noise(song.size(), 16000.0, 9);
-    for (size_t i = 0; i < song.size(); ++i) {
-        song[i] = i < 10 * 11025 ? 0.05 * song[i] : song[i] + hiss[i];
-    }
-    return song;
+inline bool same_bits(const std::vector<double> &a, const std::vector<double> &b) {
+    return a.size() == b.size() && memcmp(a.data(), b.data(), a.size() * sizeof(double)) == 0;
 }
 
 #endif

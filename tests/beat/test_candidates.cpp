@@ -7,48 +7,47 @@
 
 namespace {
 
+using frames = std::vector<int64_t>;
+
 // An envelope set up by hand. Three values at least as high must lie in the window around a peak
 // before the 97th percentile keeps it out: a plateau does that, and is no peak itself.
 struct envelope : working_context {
-    envelope(int64_t frames, int32_t bpm) : working_context(frames) { of.ctx.onset->bpm = bpm; }
+    envelope(int64_t length, int32_t bpm) : working_context(length) { of.ctx.onset->bpm = bpm; }
 
     void peak(int64_t frame, double height) { beat.onset_env[frame] = height; }
     void kept_out(int64_t frame, double height) {
         peak(frame, height);
         std::fill(beat.onset_env + frame + 10, beat.onset_env + frame + 15, 10.0);
     }
-    void rises(const std::vector<int32_t> &frames) {
-        beat.rise_count = static_cast<int32_t>(frames.size());
-        beat.rise_frames = static_cast<int32_t *>(calloc(frames.size(), sizeof(int32_t)));
-        std::copy(frames.begin(), frames.end(), beat.rise_frames);
+    void rises(const std::vector<int32_t> &at) {
+        beat.rise_count = static_cast<int32_t>(at.size());
+        beat.rise_frames = static_cast<int32_t *>(calloc(at.size(), sizeof(int32_t)));
+        std::copy(at.begin(), at.end(), beat.rise_frames);
     }
     // The frames of the peaks behind the beats: a beat lies two hops after its frame's start.
-    std::vector<int64_t> place(int32_t max_beats = 0) {
+    frames place(int32_t max_beats = 0) {
         of.ctx.onset->max_beats = max_beats;
-        std::vector<float> out(static_cast<size_t>(beat.frame_count + 50));
+        std::vector<float> out(static_cast<size_t>(candidate_room(&beat)));
         const int32_t count = getBeatCandi_MT(&beat, of.ctx.onset, out.data());
-        std::vector<int64_t> frames;
+        frames found;
         for (size_t k = 0; k < static_cast<size_t>(count); ++k) {
             const double hops = static_cast<double>(out[k]) / 1000.0 / kHop;
             EXPECT_NEAR(hops, std::round(hops), 1e-3);
-            frames.push_back(std::lround(hops) - 2);
+            found.push_back(std::lround(hops) - 2);
         }
-        return frames;
+        return found;
     }
 };
 
-using frames = std::vector<int64_t>;
-
 }  // namespace
 
-// 120 BPM: beats at least 43 frames apart, the larger first.
+// 120 BPM: beats at least 43 frames apart, the larger first. -1 and 0 mean no limit.
 TEST(Candidates, PeaksAndTheirDistance) {
     envelope env(1000, 120);
     for (const int64_t frame : {100, 143, 200, 242, 400}) env.peak(frame, 5.0);
     env.peak(200, 6.0);
     env.peak(110, 4.0);
     EXPECT_EQ(env.place(), (frames{100, 143, 200, 400}));
-    // -1 and 0 mean no limit.
     EXPECT_EQ(env.place(-1).size(), 4u);
     EXPECT_EQ(env.place(1), frames{200});
 }
@@ -63,16 +62,14 @@ TEST(Candidates, ARiseNeedsNoThreshold) {
     env.rises({290, 310});
     // Both rises take the peak at 300, so the beat appears twice, and 330 lies too close to it.
     EXPECT_EQ(env.place(), (frames{100, 300, 300, 400}));
-}
 
-// The last peak serves no rise; an ordinary one then takes the place that needs no threshold.
-TEST(Candidates, ARiseThatFindsNoPeak) {
-    envelope env(400, 120);
-    env.kept_out(200, 9.0);
-    env.peak(300, 5.0);
-    EXPECT_EQ(env.place(), frames{300});
-    env.rises({350});
-    EXPECT_EQ(env.place(), (frames{200, 300}));
+    // The last peak serves no rise; an ordinary one then takes the place that needs no threshold.
+    envelope last(400, 120);
+    last.kept_out(200, 9.0);
+    last.peak(300, 5.0);
+    EXPECT_EQ(last.place(), frames{300});
+    last.rises({350});
+    EXPECT_EQ(last.place(), (frames{200, 300}));
 }
 
 TEST(Candidates, GapsAreFilled) {
@@ -112,25 +109,47 @@ TEST(Candidates, FiftyAreAddedAtMost) {
         const int64_t start = 100 + 320 * k;
         env.peak(start, 20.0 + static_cast<double>(k));
         for (int64_t t = 1; t <= 5 && k < 12; ++t) {
-            env.kept_out(start + 48 * t,
-                         1.0 + static_cast<double>(t) / 8 + static_cast<double>(k) / 99);
+            env.kept_out(start + 48 * t, 1.0 + static_cast<double>(12 * t + k) / 99);
         }
     }
     EXPECT_EQ(env.place().size(), 13u + 50u);
-    EXPECT_EQ(env.place(11).size(), 11u + 50u);
     EXPECT_EQ(env.place(3).size(), 3u + 10u);
 }
 
 TEST(Candidates, NothingToPlace) {
+    for (const double value : {double{NAN}, double{INFINITY}, 1.0}) {
+        envelope env(500, 90);
+        std::fill(env.beat.onset_env, env.beat.onset_env + 499, value);
+        EXPECT_EQ(env.place(), frames{}) << value;
+    }
+    EXPECT_EQ(envelope(1, 90).place(), frames{});
+    EXPECT_EQ(envelope(500, 0).place(), frames{});
+}
+
+TEST(Candidates, PeaksBetweenTwoBeats) {
+    const double heights[] = {0, 0, 5, 0, 1, 0, 7, 0, 3, 0, 9, 0, 3, 0, 2, 0, 8, 0, 4, 0, 6};
+    using list = std::vector<int32_t>;
+    const list all = {2, 4, 6, 8, 10, 12, 14, 16, 18, 20};
     const struct {
-        int64_t frames;
-        int32_t bpm;
-        double value;
-    } cases[] = {{500, 90, NAN}, {500, 90, INFINITY}, {500, 90, 1.0}, {1, 90, 0.0}, {500, 0, 0.0}};
+        const char *name;
+        int32_t a, b;
+        list peaks;
+        int32_t most;
+        list expected;
+    } cases[] = {
+        {"all of five, ascending", 2, 14, all, 5, {4, 6, 8, 10, 12}},
+        {"one that rounding made smaller", 1, 13, all, 5, {4, 6, 8, 10, 12}},
+        {"the strongest of nine first", 2, 99, all, 5, {10, 16, 6, 20, 18}},
+        {"equal heights: the first one twice", 6, 20, {6, 8, 12, 14, 18, 20}, 3, {18, 8, 8}},
+        {"no later peak", 16, 99, all, 5, {18, 20}},
+        {"no peak from a on", 21, 99, all, 5, {}},
+        {"no room", 2, 14, all, 0, {}},
+    };
     for (const auto &c : cases) {
-        envelope env(c.frames, c.bpm);
-        std::fill(env.beat.onset_env, env.beat.onset_env + c.frames - 1, c.value);
-        if (c.value == 0.0 && c.frames > 1) env.peak(100, 5.0);
-        EXPECT_EQ(env.place(), frames{}) << c.frames << ' ' << c.bpm << ' ' << c.value;
+        list found(static_cast<size_t>(c.most), -1);
+        found.resize(static_cast<size_t>(bringMoreBeat(c.a, c.b, found.data(), c.peaks.data(),
+                                                       static_cast<int32_t>(c.peaks.size()), c.most,
+                                                       heights)));
+        EXPECT_EQ(found, c.expected) << c.name;
     }
 }

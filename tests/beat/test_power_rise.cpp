@@ -4,6 +4,7 @@
 
 #include "beat/power_rise.h"
 #include "tests/beat/beat_fixture.h"
+#include "tests/support/reference.h"
 
 namespace {
 
@@ -19,41 +20,18 @@ struct step {
     double sample;
 };
 
-// 21 blocks are measured, 1 to 20: block b over samples 5512 (b - 1) + 1 to 5512 b.
-std::vector<double> steps(const std::vector<step> &list, size_t n = 20 * kBlock + 100) {
-    std::vector<double> signal(n);
-    for (const step &s : list)
-        std::fill(signal.begin() + static_cast<long>(s.start), signal.end(), s.sample);
-    return signal;
-}
-
-// The flagged samples; the count returned must agree.
-std::vector<size_t> rises_of(const std::vector<double> &signal) {
-    std::vector<int32_t> flags(signal.size());
-    const int32_t count =
-        detectPowerVariation(signal.data(), flags.data(), static_cast<int64_t>(signal.size()));
-    std::vector<size_t> rises;
-    for (size_t i = 0; i < flags.size(); ++i) {
-        if (flags[i] != 0) rises.push_back(i);
-    }
-    EXPECT_EQ(static_cast<size_t>(count), rises.size());
-    return rises;
-}
-
-using samples = std::vector<size_t>;
-
 }  // namespace
 
+// Silence is at the floor of -30.31 dB, sample 0.5 at level 8191, -12.04 dB. P60 is -12.04, the
+// target twice that, level 2048: three of the ten samples around i, each 819 of the mean, must be
+// loud. 20 blocks are measured, block b over samples 5512 (b - 1) + 1 to 5512 b.
 TEST(PowerRise, Steps) {
     constexpr size_t kBegin = 10 * kBlock;
     const struct {
         const char *name;
         std::vector<step> steps;
-        samples rises;
+        std::vector<size_t> rises;
     } cases[] = {
-        // Silence is at the floor of -30.31 dB, sample 0.5 at level 8191, -12.04 dB. P60 is -12.04,
-        // the target twice that, level 2048: three of the ten samples around i, each 819 of the
-        // mean, must be loud.
         {"in a block", {{kBegin + 2000, 0.5}}, {kBegin + 1998}},
         {"at a block's start", {{kBegin + 3, 0.5}}, {kBegin + 1}},
         // Block 0 is never measured and counts as quiet.
@@ -70,39 +48,43 @@ TEST(PowerRise, Steps) {
         // which only ten loud samples reach.
         {"saturated", {{kBegin + 2000, -32768.0 / 32767.0}}, {kBegin + 2005}},
     };
-    for (const auto &c : cases) EXPECT_EQ(rises_of(steps(c.steps)), c.rises) << c.name;
-}
-
-// Loud, quiet for two blocks and loud again, in block 17 or 18 after a rise in block 11: -22 dB
-// (level 2602) lies far enough below the means. The target lies below it, so that a rise is flagged
-// at its block's boundary.
-TEST(PowerRise, NextRiseSevenBlocksLater) {
-    const size_t n = 30 * kBlock + 100;
-    const double quiet = sample_of_level(2602);
-    const auto song = [&](size_t loud_again) {
-        return steps({{0, quiet},
-                      {10 * kBlock + 2000, 0.5},
-                      {(loud_again - 4) * kBlock + 2000, quiet},
-                      {(loud_again - 1) * kBlock + 2000, 0.5}},
-                     n);
-    };
-    EXPECT_EQ(rises_of(steps({{0, quiet}, {16 * kBlock + 2000, 0.5}}, n)), samples{16 * kBlock});
-    EXPECT_EQ(rises_of(song(17)), samples{10 * kBlock});
-    EXPECT_EQ(rises_of(song(18)), (samples{10 * kBlock, 17 * kBlock}));
-}
-
-// Blocks that the song no longer has count as -150 dB, so the last rise needs eight from its own
-// on.
-TEST(PowerRise, NearTheEnd) {
-    const std::vector<step> list = {{8 * kBlock + 2000, 0.5}};
-    EXPECT_EQ(rises_of(steps(list, 16 * kBlock + 5)).size(), 1u);
-    EXPECT_EQ(rises_of(steps(list, 16 * kBlock + 4)).size(), 0u);  // block 16 is not measured
-    EXPECT_EQ(rises_of(steps(list, 16 * kBlock)).size(), 0u);
-}
-
-TEST(PowerRise, ShortAndEven) {
-    for (const size_t n : {size_t{0}, size_t{9}, size_t{10}, size_t{5517}, size_t{11023},
-                           size_t{11024}, 40 * kBlock}) {
-        EXPECT_EQ(rises_of(std::vector<double>(n, 0.5)), samples{}) << n;
+    for (const auto &c : cases) {
+        std::vector<double> signal(20 * kBlock + 100);
+        for (const step &s : c.steps) {
+            std::fill(signal.begin() + static_cast<long>(s.start), signal.end(), s.sample);
+        }
+        std::vector<int32_t> flags(signal.size());
+        const int32_t count =
+            detectPowerVariation(signal.data(), flags.data(), static_cast<int64_t>(signal.size()));
+        std::vector<int32_t> expected(signal.size());
+        for (const size_t at : c.rises) expected[at] = 1;
+        EXPECT_EQ(count, static_cast<int32_t>(c.rises.size())) << c.name;
+        EXPECT_TRUE(flags == expected) << c.name;
     }
+}
+
+// Loud and quiet by turns, at all lengths around a block's: noise, wild values, and samples whose
+// tens measure whole levels, so that a rounding more or less decides.
+TEST(PowerRise, HasTheBitsOfTheLevelsOneByOne) {
+    std::mt19937 random(7);
+    int found = 0;
+    for (int round = 0; round < 80; ++round) {
+        const size_t n = (random() % 50) * kBlock + random() % (round % 2 == 0 ? 12 : kBlock);
+        std::vector<double> signal = wild_samples(n, 20, &random);
+        double loudness = 0.1;
+        for (double &x : signal) {
+            if (random() % 25000 == 0) loudness = pow(10.0, -1.5 * fabs(uniform(&random)));
+            if (round % 4 != 0) x = loudness * uniform(&random);
+            if (round % 4 == 1) x = sqrt(floor(3276.7 * fabs(x)) * 10.0 / 32767.0);
+        }
+        if (round % 6 == 0 && n > 0) signal[random() % n] = round % 4 == 0 ? NAN : INFINITY;
+
+        std::vector<double> levels(n / kBlock + 1), db;
+        measure_block_levels({signal.data(), 1.0}, static_cast<int64_t>(n), levels.data());
+        ASSERT_TRUE(same_bits(levels, reference::block_levels(signal, &db))) << round;
+        std::vector<int32_t> flags(n);
+        found += detectPowerVariation(signal.data(), flags.data(), static_cast<int64_t>(n));
+        ASSERT_TRUE(flags == reference::rises(signal)) << round;
+    }
+    EXPECT_GT(found, 15);
 }

@@ -103,30 +103,42 @@ inline std::vector<double> threshold(const std::vector<double> &env, int64_t win
     return thr;
 }
 
-// The samples at which a power rise starts, with the level of every sample at hand.
-inline std::vector<int32_t> rises(const std::vector<double> &signal) {
+// The loudest level of each half second, dB, and in *db that of every sample.
+inline std::vector<double> block_levels(const std::vector<double> &signal,
+                                        std::vector<double> *db) {
     constexpr int64_t kBlock = 5512;
     const auto n = static_cast<int64_t>(signal.size());
-    const int64_t count = n / kBlock + 1;
-    std::vector<int32_t> flags(signal.size());
-    if (count < 3) return flags;
-    std::vector<double> db(signal.size(), -150.0), block(static_cast<size_t>(count + 8), -150.0);
+    std::vector<double> block(static_cast<size_t>(n / kBlock + 1), -150.0);
+    db->assign(signal.size(), -150.0);
     int32_t held = 0;
     double loudest = -150.0;
     for (int64_t i = 5; i <= n - 5; ++i) {
         double sum = 0.0;
         for (int64_t k = i - 5; k < i + 5; ++k)
             sum += signal[static_cast<size_t>(k)] * signal[static_cast<size_t>(k)];
-        const auto value = static_cast<int32_t>(std::min(sum / 10.0 * 32767.0, 32767.0));
+        const double mean = sum / 10.0 * 32767.0;
+        const int32_t value = mean > 0.0 ? static_cast<int32_t>(std::min(mean, 32767.0)) : 0;
         const int32_t level = std::max(value, held);
         held = level - level / 1000;
-        double &here = db[static_cast<size_t>(i)];
+        double &here = (*db)[static_cast<size_t>(i)];
         here = 20.0 * std::log10(std::max(level, 1000) / 32767.0);
         loudest = std::max(loudest, here);
         if (i % kBlock != 0) continue;
         here = block[static_cast<size_t>(i / kBlock)] = loudest;
         loudest = -150.0;
     }
+    return block;
+}
+
+// The samples at which a power rise starts, with the level of every sample at hand.
+inline std::vector<int32_t> rises(const std::vector<double> &signal) {
+    constexpr int64_t kBlock = 5512;
+    std::vector<int32_t> flags(signal.size());
+    std::vector<double> db;
+    std::vector<double> block = block_levels(signal, &db);
+    const auto count = static_cast<int64_t>(block.size());
+    if (count < 3) return flags;
+    block.resize(block.size() + 8, -150.0);
     std::vector<double> sorted(block.begin(), block.end() - 8);
     std::sort(sorted.begin(), sorted.end());
     const double p60 = sorted[static_cast<size_t>(static_cast<double>(count) * 0.6)];
