@@ -128,28 +128,20 @@ TEST(Candidates, NothingToPlace) {
 
 TEST(Candidates, PeaksBetweenTwoBeats) {
     const double heights[] = {0, 0, 5, 0, 1, 0, 7, 0, 3, 0, 9, 0, 3, 0, 2, 0, 8, 0, 4, 0, 6};
-    using list = std::vector<int32_t>;
-    const list all = {2, 4, 6, 8, 10, 12, 14, 16, 18, 20};
+    const int32_t peaks[] = {2, 4, 6, 8, 10, 12, 14, 16, 18, 20};
     const struct {
-        const char *name;
-        int32_t a, b;
-        list peaks;
-        int32_t most;
-        list expected;
+        int32_t a, b, most;
+        std::vector<int32_t> expected;
     } cases[] = {
-        {"all of five, ascending", 2, 14, all, 5, {4, 6, 8, 10, 12}},
-        {"one that rounding made smaller", 1, 13, all, 5, {4, 6, 8, 10, 12}},
-        {"the strongest of nine first", 2, 99, all, 5, {10, 16, 6, 20, 18}},
-        {"equal heights: the first one twice", 6, 20, {6, 8, 12, 14, 18, 20}, 3, {18, 8, 8}},
-        {"no later peak", 16, 99, all, 5, {18, 20}},
-        {"no peak from a on", 21, 99, all, 5, {}},
-        {"no room", 2, 14, all, 0, {}},
+        {1, 13, 5, {4, 6, 8, 10, 12}},    // all of five, though rounding made both ends smaller
+        {2, 99, 5, {10, 16, 6, 20, 18}},  // the strongest of nine first
+        {6, 16, 3, {10, 8, 8}},           // of 3, 9, 3, 2: equal heights give the first one twice
+        {16, 99, 5, {18, 20}},            // no later peak
+        {21, 99, 5, {}},
     };
     for (const auto &c : cases) {
-        list found(static_cast<size_t>(c.most), -1);
-        found.resize(static_cast<size_t>(bringMoreBeat(c.a, c.b, found.data(), c.peaks.data(),
-                                                       static_cast<int32_t>(c.peaks.size()), c.most,
-                                                       heights)));
-        EXPECT_EQ(found, c.expected) << c.name;
+        int32_t dst[5];
+        const int32_t found = bringMoreBeat(c.a, c.b, dst, peaks, 10, c.most, heights);
+        EXPECT_EQ(std::vector<int32_t>(dst, dst + found), c.expected) << c.a << " to " << c.b;
     }
 }

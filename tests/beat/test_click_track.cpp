@@ -20,22 +20,17 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 }  // namespace
 
 TEST(ClickTrack, Header) {
-    const struct {
-        uint32_t n;
-        std::string riff, data;
-    } cases[] = {{1000, "\xF4\x07\0\0"s, "\xD0\x07\0\0"s},           // 2036, 2000
-                 {0xFFFFFFFF, "\x22\0\0\0"s, "\xFE\xFF\xFF\xFF"s}};  // 32 bits wrap
-    for (const auto &c : cases) {
-        char buffer[64] = {};
-        FILE *stream = fmemopen(buffer, sizeof buffer, "wb");
-        EXPECT_EQ(makeWaveHeader(c.n, stream), 1);
-        EXPECT_EQ(ftell(stream), 44);
-        fclose(stream);
-        // 16 bytes: PCM, mono, 11025 Hz, 22050 bytes a second, 2 a frame, 16 bits
-        const std::string format =
-            "WAVEfmt \x10\0\0\0\1\0\1\0"s + "\x11\x2B\0\0"s + "\x22\x56\0\0"s + "\2\0\x10\0"s;
-        EXPECT_EQ(std::string(buffer, 44), "RIFF" + c.riff + format + "data" + c.data);
-    }
+    char buffer[64] = {};
+    FILE *stream = fmemopen(buffer, sizeof buffer, "wb");
+    EXPECT_EQ(makeWaveHeader(1000, stream), 1);
+    EXPECT_EQ(ftell(stream), 44);
+    fclose(stream);
+    // 2036 bytes; 16 bytes: PCM, mono, 11025 Hz, 22050 bytes a second, 2 a frame, 16 bits; 2000
+    // bytes
+    EXPECT_EQ(std::string(buffer, 44), "RIFF\xF4\x07\0\0WAVEfmt \x10\0\0\0\1\0\1\0"s +
+                                           "\x11\x2B\0\0"s + "\x22\x56\0\0"s +
+                                           "\2\0\x10\0"
+                                           "data\xD0\x07\0\0"s);
 }
 
 // i e^(-i/110) cos(2 pi 4000 i / 11025) / 160, at the sample nearest to 11025.44.

@@ -1,0 +1,161 @@
+// The FFT, the direct transforms, the mel scale and the matrix product on values known by hand;
+// random ones go through fuzz/toolkit.cpp.
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <complex>
+#include <limits>
+#include <random>
+#include <vector>
+
+#include "dsp/fft.h"
+#include "dsp/matrix.h"
+#include "dsp/mel.h"
+
+namespace {
+
+using list = std::vector<double>;
+
+constexpr double kInf = std::numeric_limits<double>::infinity();
+constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
+
+}  // namespace
+
+TEST(Fft, KnownTransforms) {
+    const struct {
+        list x, re, im;
+        double bound;
+    } cases[] = {{{1, 0, 0, 0, 0, 0, 0, 0}, list(8, 1.0), list(8), 0.0},
+                 {list(8, 1.0), {8, 0, 0, 0, 0, 0, 0, 0}, list(8), 0.0},
+                 {{0, 1, 0, 0}, {1, 0, -1, 0}, {0, -1, 0, 1}, 1e-15}};
+    for (const auto &c : cases) {
+        list re = c.x, im(c.x.size());
+        const auto n = static_cast<int16_t>(re.size());
+        TAVO_FFT_CTX ctx;
+        tavo_fft_init(n, &ctx);
+        EXPECT_EQ(tavo_fft_proc(re.data(), im.data(), n, &ctx), re.data());
+        tavo_fft_deinit(&ctx);
+        for (size_t k = 0; k < re.size(); ++k) {
+            EXPECT_NEAR(re[k], c.re[k], c.bound) << k;
+            EXPECT_NEAR(im[k], c.im[k], c.bound) << k;
+        }
+    }
+}
+
+TEST(Fft, TablesListEveryPairOnce) {
+    TAVO_FFT_CTX ctx;
+    tavo_fft_init(8, &ctx);
+    EXPECT_EQ(ctx.stages, 3);
+    const std::vector<uint32_t> listed(ctx.bit_reverse, ctx.bit_reverse + 8);
+    EXPECT_EQ(listed, (std::vector<uint32_t>{0, 4, 2, 6, 0, 5, 0, 7}));
+    EXPECT_EQ(ctx.cos_table[0], 1.0);
+    EXPECT_DOUBLE_EQ(ctx.cos_table[1], std::sqrt(0.5));
+    EXPECT_DOUBLE_EQ(ctx.sin_table[1], -std::sqrt(0.5));
+    EXPECT_EQ(ctx.sin_table[2], -1.0);
+    for (int k = 4; k < 8; ++k) EXPECT_TRUE(ctx.cos_table[k] == 0.0 && ctx.sin_table[k] == 0.0);
+    tavo_fft_deinit(&ctx);
+    tavo_fft_deinit(&ctx);
+    EXPECT_TRUE(ctx.cos_table == nullptr && ctx.sin_table == nullptr && ctx.bit_reverse == nullptr);
+}
+
+TEST(Fft, RefusesSizesThatAreNoPowerOfTwo) {
+    for (const int size : {-32768, -4, 0, 1, 3, 12, 32767}) {
+        const auto n = static_cast<int16_t>(size);
+        TAVO_FFT_CTX ctx;
+        tavo_fft_init(n, &ctx);
+        EXPECT_TRUE(ctx.cos_table == nullptr && ctx.stages == 0) << n;
+        double re[3] = {1, 2, 3}, im[3] = {4, 5, 6};
+        EXPECT_EQ(tavo_fft_proc(re, im, n, &ctx), re);
+        EXPECT_TRUE(re[1] == 2.0 && im[2] == 6.0);
+    }
+    EXPECT_EQ(bit_reverse2(3, 1), 4u);
+    EXPECT_EQ(bit_reverse2(3, 6), 3u);
+    EXPECT_EQ(bit_reverse2(1, 3), 1u);
+    EXPECT_EQ(bit_reverse2(31, 1), 1u << 30);
+    EXPECT_EQ(bit_reverse2(32, 5), 0u);
+}
+
+// The excerpt's sizes, too long for the fuzzer: within a billionth of the values' number, none of
+// which exceeds 1. What must not be read holds poison.
+TEST(Dft, LongTransformsAreTheirSums) {
+    constexpr size_t kSize = 4096;
+    std::mt19937 random(1);
+    std::vector<std::complex<double>> x(kSize);
+    for (auto &value : x) value = {static_cast<double>(random()) / 4294967296.0, 0.0};
+    const auto sum = [&](size_t count, size_t k, double sign) {
+        std::complex<double> total = 0.0;
+        for (size_t i = 0; i < count; ++i) {
+            total += x[i] * std::polar(1.0, sign * 2.0 * M_PI * static_cast<double>(i * k % kSize) /
+                                                static_cast<double>(kSize));
+        }
+        return total;
+    };
+    list re(kSize, kNan), im(kSize, kNan);
+    for (size_t i = 0; i < 2584; ++i) re[i] = x[i].real();
+    ASSERT_EQ(tavo_dft(re.data(), im.data(), kSize, 2584, 1), 0);
+    for (size_t k = 0; k < kSize; k += 97) {
+        EXPECT_NEAR(re[k], sum(2584, k, -1.0).real(), 4e-6) << k;
+        EXPECT_NEAR(im[k], sum(2584, k, -1.0).imag(), 4e-6) << k;
+    }
+    for (size_t i = 0; i < kSize; ++i) re[i] = x[i].real();
+    im.assign(kSize, kNan);
+    ASSERT_EQ(tavo_inverse_dft(re.data(), im.data(), kSize, 86, 1), 0);
+    for (size_t t = 0; t < 86; ++t) EXPECT_NEAR(re[t], sum(kSize, t, 1.0).real() / kSize, 1e-9);
+    EXPECT_EQ(re[86], x[86].real());
+    EXPECT_TRUE(std::isnan(im[86]));
+}
+
+// cos(2 pi 3 k / 8) at k = 0, 1, 3, 4: an infinite value keeps its sign.
+TEST(Dft, AnInfiniteValue) {
+    list re = {0, 0, 0, kInf, 0, 0, 0, 0}, im(8);
+    tavo_dft(re.data(), im.data(), 8, 4, 1);
+    EXPECT_TRUE(re[0] == kInf && re[1] == -kInf && re[3] == kInf && re[4] == -kInf);
+}
+
+TEST(Dft, LengthsOutsideTheRange) {
+    list re = {1, 2}, im = {3, 4};
+    for (const int64_t n : {int64_t{0}, int64_t{-1}, INT64_MIN}) {
+        EXPECT_EQ(tavo_dft(re.data(), im.data(), n, n, 0), 0);
+        EXPECT_EQ(tavo_inverse_dft(re.data(), im.data(), n, n, 0), 0);
+    }
+    EXPECT_EQ(tavo_inverse_dft(re.data(), im.data(), 2, -1, 0), 0);
+    EXPECT_EQ(tavo_inverse_dft(re.data(), im.data(), INT64_MAX, 2, 0), -2);
+    EXPECT_TRUE(re == list({1, 2}) && im == list({3, 4}));
+    EXPECT_EQ(tavo_dft(re.data(), im.data(), 2, 99, 0), 0);  // as with all 2 values
+    EXPECT_NEAR(re[0], 3.0, 1e-15);
+    EXPECT_NEAR(im[1], -1.0, 1e-15);
+}
+
+TEST(Mel, BothWays) {
+    const struct {
+        float hz, mel;
+    } cases[] = {{0.0f, 0.0f},          {500.0f, 7.499996f},   {999.9f, 14.998492f},
+                 {1000.0f, 15.0f},      {2000.0f, 25.077812f}, {5512.0f, 39.817379f},
+                 {11025.0f, 49.896507f}};
+    for (const auto &c : cases) EXPECT_FLOAT_EQ(Hz2Mel(c.hz), c.mel);
+    const struct {
+        float mel, hz;
+    } back[] = {{7.5f, 500.00027f}, {15.0f, 1000.0f}, {20.0f, 1410.4342f}, {39.8174f, 5512.0093f}};
+    for (const auto &c : back) EXPECT_FLOAT_EQ(Mel2Hz(c.mel), c.hz);
+    // The neighbouring float is what an unrounded logarithm or exponential would give.
+    EXPECT_EQ(Hz2Mel(2333.0f), 27.3169632f);
+    EXPECT_EQ(Hz2Mel(2703.0f), 29.457243f);
+    EXPECT_EQ(Mel2Hz(17.85f), 1216.55334f);
+    EXPECT_EQ(Mel2Hz(Hz2Mel(5512.0f)), 5512.0005f);
+}
+
+// No row where the weight is zero; a zero term touches nothing, not even infinity.
+TEST(Matrix, ZeroFactors) {
+    const auto infinity = static_cast<float>(kInf);
+    const float a0[] = {0.0f, 2.0f, infinity}, b1[] = {1.0f, infinity}, b2[] = {0.0f, 1.0f};
+    const float *a[] = {a0}, *b[] = {nullptr, b1, b2};
+    double d0[2] = {7.0, 7.0};
+    double *d[] = {d0};
+    EXPECT_EQ(MultiplyMtxs(1, 0, 3, nullptr, nullptr, d), 1);
+    EXPECT_EQ(MultiplyMtxs(0, 2, 3, nullptr, nullptr, d), 0);
+    EXPECT_EQ(d0[0], 7.0);
+    EXPECT_EQ(MultiplyMtxs(1, 2, 3, a, b, d), 1);
+    EXPECT_TRUE(d0[0] == 2.0 && d0[1] == kInf);
+    EXPECT_EQ(MultiplyMtxs(1, 2, 0, nullptr, nullptr, d), 1);
+    EXPECT_TRUE(d0[0] == 0.0 && d0[1] == 0.0);
+}
