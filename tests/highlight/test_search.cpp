@@ -1,158 +1,216 @@
+// Valleys, the search and the region, on loudness curves drawn by hand.
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <sstream>
+#include <string>
 #include <vector>
 
+#include "highlight/region.h"
 #include "highlight/search.h"
 
 namespace {
 
-// Envelopes of 60 points (2 s each) and a largest value of 1: the normalised values are these. From
-// 90 s on, edges count from point 9 on and up to point 60 - 25 = 35; below, from 0 to 50.
-struct RUN {
-    int count;
-    float value;
-};
+using indexes = std::vector<int32_t>;
 
-std::vector<float> runs(const std::vector<RUN> &list, size_t points = 60) {
+// Loud everywhere but at the low points; with mean 0.5 and deviation 0.25 the threshold is 0.25.
+indexes valleys(const indexes &lows, float hop_s = 2.0f) {
+    std::vector<float> values(120, 0.75f);
+    for (const int32_t low : lows) values[static_cast<size_t>(low)] = 0.125f;
+    indexes out(15, -99);
+    const int32_t count = tavo_find_valley(values.data(), 120, out.data(), 0.5f, 0.25f, hop_s);
+    EXPECT_EQ(std::count(out.begin(), out.end(), -99), 15 - count);
+    return {out.begin(), out.begin() + count};
+}
+
+// Curves of points (2 s each) and a largest value of 1: the normalised values are these. From 90 s
+// on, edges count from point 9 on and up to 25 points before the end; below, from 0 and up to 10.
+// Pairs of how many points have which value.
+std::vector<float> runs(const std::string &pairs, size_t points = 60) {
     std::vector<float> power;
-    for (const RUN &run : list) {
-        power.insert(power.end(), static_cast<size_t>(run.count), run.value);
-    }
+    std::istringstream in(pairs);
+    float value = 0.0f;
+    for (size_t count = 0; in >> count >> value;) power.insert(power.end(), count, value);
     EXPECT_EQ(power.size(), points);
     return power;
 }
 
 uint32_t search(std::vector<float> power, int32_t duration_s, int32_t hl_param = 0) {
-    TAVO_HL_CTX hl = {};
-    hl.hl_param = hl_param;
-    hl.power = power.data();
-    hl.power_count = static_cast<int32_t>(power.size());
+    TAVO_HL_CTX hl = {hl_param, power.data(), static_cast<int32_t>(power.size()), 0};
     return _get_HL_simple(&hl, duration_s);
 }
 
-TEST(Search, TheRiseIntoTheLoudPassage) {
-    auto song = runs({{20, 0.4f}, {10, 0.9f}, {1, 1.0f}, {19, 0.9f}, {10, 0.4f}});
-    EXPECT_EQ(search(song, 120), 38000u);
-    for (float &value : song) value *= 0.125f;  // measured by its largest
-    EXPECT_EQ(search(song, 120), 38000u);
+// A loud song with some points at other levels; mean 0.5.
+struct song {
+    int32_t n;
+    float std;
+    std::vector<std::pair<int32_t, float>> points;
+};
+
+uint32_t region(const song &of, int32_t chosen, int32_t len_pts, indexes found,
+                const indexes &pairs) {
+    std::vector<float> norm(static_cast<size_t>(of.n), 0.875f);
+    for (const auto &point : of.points) norm[static_cast<size_t>(point.first)] = point.second;
+    const auto nv = static_cast<int32_t>(found.size());
+    found.resize(15);
+    return tavo_select_highlight_region(norm.data(), of.n, len_pts, chosen, nv, found.data(),
+                                        pairs.empty() ? nullptr : pairs.data(),
+                                        static_cast<int32_t>(pairs.size() / 2), 0.5f, of.std);
 }
 
-// Edge at 14: 0.1 to 0.45 in one step, score 0.35 + 0.35. Edge at 28: a smaller step, 0.3, but from
-// 0.225 on average to 0.65, score 0.425 + 0.3.
-TEST(Search, ASmallerStepWithTheBetterScoreWins) {
-    const std::vector<RUN> song = {{3, 0.1f}, {1, 1.0f},  {11, 0.1f},  {6, 0.45f},
-                                   {7, 0.1f}, {1, 0.35f}, {12, 0.65f}, {19, 0.1f}};
-    EXPECT_EQ(search(runs(song), 120), 56000u);
+}  // namespace
+
+TEST(Valleys, EndsOfTheQuietStretches) {
+    EXPECT_EQ(valleys({}), indexes{});
+    EXPECT_EQ(valleys({0, 1, 5, 6, 12}), (indexes{1, 6, 12}));
+    EXPECT_EQ(valleys({0, 10}), (indexes{10}));  // the opening is no valley
+    EXPECT_EQ(valleys({0}), (indexes{0}));       // unless it is all there is
+    EXPECT_EQ(valleys({4, 6, 9}), (indexes{6, 9}));
+    EXPECT_EQ(valleys({4, 6, 9}, 1.0f), (indexes{9}));  // the gap is then 7 points
+    EXPECT_EQ(valleys({4, 10, 16}, 0.0f), (indexes{16}));
+    indexes lows;
+    for (int32_t k = 1; k <= 20; ++k) lows.push_back(5 * k);
+    EXPECT_EQ(valleys(lows), indexes(lows.begin(), lows.begin() + 15));
 }
 
-// Edge at 13: 0.5625 + 0.4375. Edge at 30: 0.5 + 0.5. All exact in binary.
-TEST(Search, OfEqualScoresTheLargerStepWins) {
-    const std::vector<RUN> song = {{3, 0.125f},  {1, 1.0f},   {9, 0.125f}, {1, 0.375f},
-                                   {7, 0.8125f}, {10, 0.25f}, {10, 0.75f}, {19, 0.25f}};
-    EXPECT_EQ(search(runs(song), 120), 60000u);
+// Mean above 0.5: below 0.75 - 1.5 x 0.25 = 0.375. Mean 0.5 exactly is not above: below 0.375 as
+// well, not 0.3125.
+TEST(Valleys, LoudSongsNeedDeeperDips) {
+    const float values[] = {1.0f, 0.5f, 1.0f, 1.0f, 1.0f, 0.25f, 1.0f, 0.34375f, 1.0f};
+    int32_t out[15];
+    ASSERT_EQ(tavo_find_valley(values, 7, out, 0.75f, 0.25f, 2.0f), 1);
+    EXPECT_EQ(out[0], 5);
+    EXPECT_EQ(tavo_find_valley(values + 6, 3, out, 0.5f, 0.125f, 2.0f), 1);
+    EXPECT_EQ(tavo_find_valley(values + 6, 3, out, 0.5625f, 0.25f, 2.0f), 0);
 }
 
-TEST(Search, TheOpeningCountsInShortSongsOnly) {
-    const auto song = runs({{5, 0.25f}, {10, 1.0f}, {16, 0.25f}, {10, 0.75f}, {19, 0.25f}});
-    EXPECT_EQ(search(song, 180), 60000u);
-    EXPECT_EQ(search(song, 90), 60000u);
-    EXPECT_EQ(search(song, 89), 8000u);
-}
-
-// At the last scored point the edge itself is the answer; one later it is the point after the edge,
-// as the last edge left when none passes.
-TEST(Search, TheEndIsNotScored) {
+TEST(Search, Edges) {
     const struct {
-        int rise;
-        int loud;
+        const char *curve;
         int32_t duration_s;
         uint32_t ms;
-    } cases[] = {{35, 10, 90, 70000}, {36, 10, 90, 74000}, {35, 10, 89, 70000},
-                 {36, 10, 89, 72000}, {50, 5, 89, 100000}, {51, 5, 89, 104000}};
-    for (const auto &c : cases) {
-        const auto song =
-            runs({{c.rise + 1, 0.25f}, {c.loud, 1.0f}, {59 - c.rise - c.loud, 0.25f}});
-        EXPECT_EQ(search(song, c.duration_s), c.ms) << c.rise << " in " << c.duration_s << " s";
-    }
+    } cases[] = {
+        {"20 0.4 10 0.9 1 1 19 0.9 10 0.4", 120, 38000},  // into the loud passage
+        // Edge at 14: 0.1 to 0.45 in one step, score 0.35 + 0.35. Edge at 28: a smaller step, 0.3,
+        // but from 0.225 on average to 0.65, score 0.425 + 0.3.
+        {"3 0.1 1 1 11 0.1 6 0.45 7 0.1 1 0.35 12 0.65 19 0.1", 120, 56000},
+        // Edge at 13: 0.5625 + 0.4375. Edge at 30: 0.5 + 0.5. All exact in binary; the larger step.
+        {"3 0.125 1 1 9 0.125 1 0.375 7 0.8125 10 0.25 10 0.75 19 0.25", 120, 60000},
+        // The opening counts in short songs only.
+        {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 90, 60000},
+        {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 89, 8000},
+        // One edge, at 5, inside the loud passage that is open from the start; the later rise has
+        // no strict maximum. Without the segment the answer would be the point after the edge.
+        {"6 0.75 24 1 11 0.25 1 0.5 1 0.75 8 0.875 9 0.25", 80, 10000},
+        // At the last scored point the edge itself is the answer; one later it is the point after
+        // the edge, as the last edge left when none passes.
+        {"36 0.25 10 1 14 0.25", 90, 70000},
+        {"37 0.25 10 1 13 0.25", 90, 74000},
+        {"51 0.25 5 1 4 0.25", 89, 100000},
+        {"52 0.25 5 1 3 0.25", 89, 104000},
+        // Bursts of two points are too short to be scored: the first edge that no valley follows
+        // closely is taken, at the point after it. Dips below 0.336 are low points; the valley is
+        // the last of them: at 23, 3 after the edge at 20, or at 24.
+        {"20 0.5 1 1 1 0.9 1 0.3 1 0.1 1 0.4 5 0.5 2 0.85 28 0.5", 120, 60000},
+        {"20 0.5 1 1 1 0.9 1 0.5 1 0.3 1 0.1 1 0.4 4 0.5 2 0.85 28 0.5", 120, 40000},
+        {"30 1 30 0.5", 120, 0},  // no rising edge
+        {"60 0", 120, 0},
+    };
+    for (const auto &c : cases) EXPECT_EQ(search(runs(c.curve), c.duration_s), c.ms) << c.curve;
+    // 9 are skipped and 4 are too few; one point more is enough, its only edge, at 11, is not
+    // scored.
+    EXPECT_EQ(search(runs("11 0.25 2 1", 13), 100), 0u);
+    EXPECT_EQ(search(runs("12 0.25 2 1", 14), 100), 24000u);
 }
 
 // Thirty loud passages, the last the loudest: it is the last one that is looked at.
 TEST(Search, ThirtyPassages) {
-    std::vector<RUN> passages;
-    for (int k = 0; k < 29; ++k) passages.insert(passages.end(), {{4, 0.25f}, {6, 0.75f}});
-    passages.insert(passages.end(), {{4, 0.25f}, {6, 1.0f}, {30, 0.25f}});
-    EXPECT_EQ(search(runs(passages, 330), 660), 2000u * 293u);
-}
-
-// Bursts of two points are too short to be scored: the first edge that no valley follows closely is
-// taken, at the point after it. Dips below 0.336 are low points; the valley is the last of them.
-TEST(Search, WithoutAScoreAValleyNearTheEdgeRulesItOut) {
-    const auto song = [](const std::vector<RUN> &after_the_edge) {
-        std::vector<RUN> list = {{20, 0.5f}, {1, 1.0f}, {1, 0.9f}};
-        list.insert(list.end(), after_the_edge.begin(), after_the_edge.end());
-        list.insert(list.end(), {{4, 0.5f}, {2, 0.85f}, {28, 0.5f}});
-        return runs(list);
-    };
-    auto near = song({{1, 0.3f}, {1, 0.1f}, {1, 0.4f}, {1, 0.5f}});
-    EXPECT_EQ(search(near, 120), 60000u);  // the valley at 23 is 3 after 20
-    near[52] = 0.1f;                       // a second one
-    EXPECT_EQ(search(near, 120), 60000u);
-    const auto far = song({{1, 0.5f}, {1, 0.3f}, {1, 0.1f}, {1, 0.4f}});
-    EXPECT_EQ(search(far, 120), 40000u);  // at 24 it is 4 after
-}
-
-TEST(Search, ASongLoudFromItsFirstPointHasASegmentThere) {
-    // One edge, at 5, inside the loud passage that is open from the start; the later rise has no
-    // strict maximum. Without the segment the answer would be the point after the edge.
-    const auto song =
-        runs({{6, 0.75f}, {24, 1.0f}, {11, 0.25f}, {1, 0.5f}, {1, 0.75f}, {8, 0.875f}, {9, 0.25f}});
-    EXPECT_EQ(search(song, 80), 10000u);
-}
-
-TEST(Search, NoRisingEdge) {
-    std::vector<float> falling;
-    for (int k = 0; k < 60; k++) falling.push_back(1.0f - static_cast<float>(k) / 64.0f);
-    EXPECT_EQ(search(falling, 120), 0u);
-    EXPECT_EQ(search(std::vector<float>(60, 1.0f), 120), 0u);
-}
-
-TEST(Search, TooLittleOrNothing) {
-    EXPECT_EQ(search(runs({{11, 0.25f}, {2, 1.0f}}, 13), 100), 0u);  // 9 are skipped
-    EXPECT_EQ(search(std::vector<float>(60, 0.0f), 120), 0u);
-    TAVO_HL_CTX empty = {};
-    EXPECT_EQ(_get_HL_simple(&empty, 120), 0u);
-    // One point more is enough: its only edge, at 11, is not scored and gives the point after.
-    EXPECT_EQ(search(runs({{12, 0.25f}, {2, 1.0f}}, 14), 100), 24000u);
+    std::string passages;
+    for (int k = 0; k < 29; ++k) passages += "4 0.25 6 0.75 ";
+    EXPECT_EQ(search(runs(passages + "4 0.25 6 1 30 0.25", 330), 660), 2000u * 293u);
 }
 
 // Segments (9, 13) and (29, 49), no valleys; the edge at 29 is chosen and the region ends at 49,
 // 20 points on.
 TEST(Search, ARequestedLengthMovesTheStart) {
-    const auto song = runs({{10, 0.25f}, {4, 0.75f}, {16, 0.25f}, {20, 1.0f}, {10, 0.25f}});
-    const struct {
-        int32_t hl_param;
-        uint32_t ms;
-    } cases[] = {
+    const auto curve = runs("10 0.25 4 0.75 16 0.25 20 1 10 0.25");
+    const std::pair<int32_t, uint32_t> cases[] = {
         {0, 58000},   {-30, 58000}, {44, 58000},  // 22 points reach back 2: not worth moving
         {46, 58000},                              // ideal 26: 29 is the nearest boundary
         {60, 26000},                              // ideal 19: 13 is
         {61, 26000},                              // the same number of points
-        {74, 26000},                              // ideal 12
         {102, 18000},                             // 9 + 51 reaches the end: the first segment
         {104, 18000},                             // and 9 + 52 passes it
     };
-    for (const auto &c : cases) EXPECT_EQ(search(song, 120, c.hl_param), c.ms) << c.hl_param;
-}
-
-// What passes the song's end begins at the first segment or the first valley, whichever is earlier,
-// or at the one there is. The dips to 0.1 are far below the rest.
-TEST(Search, ALengthBeyondTheEndStartsEarly) {
-    const auto valley_first = runs({{20, 0.5f}, {1, 0.1f}, {9, 0.5f}, {20, 1.0f}, {10, 0.5f}});
+    for (const auto &c : cases) EXPECT_EQ(search(curve, 120, c.first), c.second) << c.first;
+    // What passes the end begins at the first segment or the first valley, whichever is earlier, or
+    // at the one there is. The dips to 0.1 are far below the rest.
+    const auto valley_first = runs("20 0.5 1 0.1 9 0.5 20 1 10 0.5");
     EXPECT_EQ(search(valley_first, 120, 80), 40000u);  // 20 + 40; the segment is at 29
-    const auto segment_first = runs({{10, 0.5f}, {20, 1.0f}, {9, 0.5f}, {1, 0.1f}, {20, 0.5f}});
+    const auto segment_first = runs("10 0.5 20 1 9 0.5 1 0.1 20 0.5");
     EXPECT_EQ(search(segment_first, 120, 102), 18000u);  // 9 + 51; the valley is at 39
-    const auto valley_only = runs({{20, 0.5f}, {1, 1.0f}, {10, 0.5f}, {1, 0.1f}, {28, 0.5f}});
+    const auto valley_only = runs("20 0.5 1 1 10 0.5 1 0.1 28 0.5");
     EXPECT_EQ(search(valley_only, 120, 58), 62000u);  // 31 + 29
 }
 
-}  // namespace
+// Chosen 40 in a song of 120 points unless said otherwise.
+TEST(Region, Places) {
+    const song loud = {120, 0.25f, {}}, hundred = {100, 0.25f, {}}, fifty = {50, 0.25f, {}};
+    const song deep = {120, 0.25f, {{50, 0.375f}, {51, 0.375f}, {52, 0.375f}, {53, 0.375f}}};
+    song shallow = {120, 0.625f, deep.points};
+    shallow.points.insert(shallow.points.end(),
+                          {{55, 0.3125f}, {57, 0.375f}, {58, 0.375f}, {60, 0.375f}});
+    const song enough = {120, 0.5f, shallow.points};
+    const song dip = {120, 0.25f, {{50, 0.375f}, {54, 0.25f}}};
+    const song early = {120, 0.25f, {{46, 0.25f}, {48, 0.25f}, {49, 0.25f}}};
+    const song low = {50, 0.25f, {{48, 0.25f}}};
+    const song drop = {50, 0.25f, {{46, 0.25f}, {48, 0.25f}, {49, 0.25f}}};
+    const struct {
+        const char *name;
+        const song *of;
+        int32_t chosen, len_pts;
+        indexes valleys, pairs;
+        uint32_t start;
+    } cases[] = {
+        {"the next valley is the end", &loud, 40, 15, {34, 50}, {}, 34},
+        {"2 points back are not worth it", &loud, 40, 12, {34, 50}, {}, 40},
+        {"34 is 3 off: the ideal start itself", &loud, 40, 13, {34, 50}, {}, 37},
+        {"25 points on", &loud, 40, 30, {65}, {}, 35},
+        {"26 are too far, and no end is found", &loud, 40, 30, {66}, {}, 10},
+        // Ideal start 35.
+        {"the valley before", &loud, 40, 15, {37, 50}, {}, 37},
+        {"3 off", &loud, 40, 15, {38, 50}, {}, 35},
+        {"at chosen itself: none before", &loud, 40, 15, {34, 40, 50}, {}, 35},
+        {"back to the last that comes nearer to 31", &loud, 40, 19, {20, 30, 34, 39, 50}, {}, 30},
+        {"the song's first point is no candidate", &loud, 6, 9, {0, 10}, {}, 1},
+        {"equally near: the valley", &loud, 40, 15, {38, 50}, {32, 60}, 38},
+        {"a segment's boundary", &loud, 40, 15, {38, 50}, {33, 60}, 33},
+        {"also as the last boundary", &loud, 40, 15, {38, 50}, {20, 33}, 33},
+        {"which needs a valley", &loud, 40, 15, {50}, {20, 33}, 35},
+        {"another follows", &loud, 40, 15, {50}, {20, 33, 60, 70}, 33},
+        {"60 is farther", &loud, 40, 15, {50}, {20, 60}, 20},
+        {"0 is no boundary", &loud, 40, 15, {50}, {0, 90}, 35},
+        // Without a valley the end is sought from 14 s to 48 s after chosen: points 47 to 64.
+        {"a fall of one deviation ends it at 50", &deep, 40, 15, {}, {}, 35},
+        {"the deepest of the falls, 55", &shallow, 40, 20, {}, {}, 35},
+        {"one deviation, reached at 50 exactly", &enough, 40, 15, {}, {}, 35},
+        {"no fall that lasts: the lowest, 54", &dip, 40, 19, {}, {}, 35},
+        {"a segment around chosen: its end, 60", &dip, 40, 25, {}, {30, 60}, 30},
+        {"40 is not inside (10, 40)", &dip, 40, 19, {}, {10, 40, 60, 70}, 40},
+        {"46 is too early; nothing is lower than 48", &early, 40, 15, {}, {}, 33},
+        {"nothing low: the last point, 49", &fifty, 40, 14, {}, {}, 35},
+        {"a low point without followers is no fall", &low, 40, 14, {}, {}, 34},
+        {"the last place with both followers", &drop, 39, 13, {}, {}, 33},
+        {"ends at 100 exactly", &hundred, 90, 10, {98}, {30, 99}, 90},
+        {"too long: the earlier of 99 and 30", &hundred, 90, 11, {99}, {30, 99}, 30},
+        {"no segment reads 0", &hundred, 90, 11, {99}, {}, 0},
+        {"neither fits", &hundred, 90, 11, {99}, {95, 99}, 0},
+        {"the valley is earlier", &hundred, 98, 3, {20}, {30, 99}, 20},
+        {"endless", &hundred, 90, INT32_MAX, {}, {}, 0},
+        {"behind the song", &loud, 120, 15, {50}, {}, 0},
+        {"before it", &loud, -1, 15, {50}, {}, 0},
+    };
+    for (const auto &c : cases) {
+        EXPECT_EQ(region(*c.of, c.chosen, c.len_pts, c.valleys, c.pairs), c.start) << c.name;
+    }
+}
