@@ -1,6 +1,7 @@
 // replay DIR RUNS: gives a fuzzer's function every file in DIR, then RUNS inputs made of their
 // pieces and of random bytes, the same ones each time. For compilers without libFuzzer, and for
-// every test run.
+// every test run. The input of a failure is left in fuzz_last_input.
+#include <csignal>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -32,10 +33,33 @@ bytes next_input(const std::vector<bytes> &kept) {
     return input;
 }
 
+bytes last;
+
+void keep_last() {
+    std::ofstream("fuzz_last_input", std::ios::binary)
+        .write(reinterpret_cast<const char *>(last.data()),
+               static_cast<std::streamsize>(last.size()));
+}
+
+void stop(int number) {
+    keep_last();
+    signal(number, SIG_DFL);
+    raise(number);
+}
+
+void run(bytes input) {
+    last = std::move(input);
+    LLVMFuzzerTestOneInput(last.data(), last.size());
+}
+
 }  // namespace
+
+extern "C" void __sanitizer_set_death_callback(void (*callback)()) __attribute__((weak));
 
 int main(int argc, char **argv) {
     if (argc != 3) return 2;
+    if (__sanitizer_set_death_callback != nullptr) __sanitizer_set_death_callback(keep_last);
+    for (const int number : {SIGABRT, SIGSEGV}) signal(number, stop);
     std::vector<std::filesystem::path> paths;
     for (const auto &entry : std::filesystem::directory_iterator(argv[1]))
         paths.push_back(entry.path());
@@ -44,17 +68,10 @@ int main(int argc, char **argv) {
     for (const auto &path : paths) {
         std::ifstream in(path, std::ios::binary);
         kept.emplace_back(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-        fprintf(stderr, "%s\n", path.c_str());
-        LLVMFuzzerTestOneInput(kept.back().data(), kept.back().size());
+        run(kept.back());
     }
     fuzz::must(!kept.empty(), "there are kept inputs");
-    for (long i = 0; i < atol(argv[2]); ++i) {
-        const bytes input = next_input(kept);
-        std::ofstream("fuzz_last_input", std::ios::binary)
-            .write(reinterpret_cast<const char *>(input.data()),
-                   static_cast<std::streamsize>(input.size()));
-        LLVMFuzzerTestOneInput(input.data(), input.size());
-    }
+    for (long i = 0; i < atol(argv[2]); ++i) run(next_input(kept));
     printf("%zu kept inputs, %s made ones\n", kept.size(), argv[2]);
     return 0;
 }

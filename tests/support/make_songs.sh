@@ -2,14 +2,18 @@
 # make_songs.sh MAKE_SONG DIR: makes every song that the tests read, by make_song and Debian's encoders.
 # DIR/codec: every kind of stream and container. DIR/formats: one song in each format. DIR/short: songs
 # whose analysis takes milliseconds. DIR/jni: WAV files. Nothing is done when DIR is
-# complete and newer than this script and MAKE_SONG.
+# complete and newer than this script and the sources of MAKE_SONG.
 set -eu
 make_song=$1
 out=$2
 for tool in ffmpeg lame flac metaflac oggenc; do
   command -v "$tool" >/dev/null || { echo "make_songs.sh: $tool is missing" >&2; exit 1; }
 done
-if [ -e "$out/.complete" ] && [ "$out/.complete" -nt "$0" ] && [ "$out/.complete" -nt "$make_song" ]; then
+mkdir -p "$out"
+exec 9>"$out.lock"
+flock 9 # another build's tests
+here=$(dirname "$0")
+if [ -e "$out/.complete" ] && [ -z "$(find "$0" "$here"/*song*.cpp -newer "$out/.complete")" ]; then
   exit 0
 fi
 rm -rf "$out"
