@@ -37,17 +37,21 @@ const std::string &song_path() {
 }
 
 void setup(jobject object = fake_vm::new_object()) {
-    Java_com_kestu_tavo_Tavo_native_1setup(fake_vm::environment(), fake_vm::new_object(), object);
+    Java_com_kestu_tavo_Tavo_native_1setup(&fake_vm::env, fake_vm::new_object(), object);
 }
-jint init(jstring path = fake_vm::new_string(song_path())) {
-    return Java_com_kestu_tavo_Tavo_init(fake_vm::environment(), fake_vm::new_object(), path,
+// The fake machine's strings are their characters.
+jstring as_string(const char *path) {
+    return reinterpret_cast<jstring>(const_cast<char *>(path));
+}
+jint init(jstring path = as_string(song_path().c_str())) {
+    return Java_com_kestu_tavo_Tavo_init(&fake_vm::env, fake_vm::new_object(), path,
                                          TAVO_MODE_HIGHLIGHT);
 }
 jint analyze() {
-    return Java_com_kestu_tavo_Tavo_analyze(fake_vm::environment(), fake_vm::new_object(), 0, 0, 0);
+    return Java_com_kestu_tavo_Tavo_analyze(&fake_vm::env, fake_vm::new_object(), 0, 0, 0);
 }
 jint deinit() {
-    return Java_com_kestu_tavo_Tavo_deinit(fake_vm::environment(), fake_vm::new_object());
+    return Java_com_kestu_tavo_Tavo_deinit(&fake_vm::env, fake_vm::new_object());
 }
 
 void call_back_on_a_thread(TAVO_INFO info) {
@@ -55,7 +59,7 @@ void call_back_on_a_thread(TAVO_INFO info) {
 }
 
 void expect_held(int global_references) {
-    const fake_vm::balance held = fake_vm::held();
+    const fake_vm::balance &held = fake_vm::now;
     EXPECT_EQ(held.global_references, global_references);
     EXPECT_EQ(held.lent, 0);
     EXPECT_EQ(held.wrong, 0);
@@ -66,9 +70,9 @@ struct Jni : testing::Test {
     void SetUp() override {
         fnamedec = "";
         fake_vm::reset();
-        ASSERT_EQ(JNI_OnLoad(fake_vm::machine(), nullptr), JNI_VERSION_1_6);
+        ASSERT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), JNI_VERSION_1_6);
         setup();
-        fake_vm::take_log();
+        fake_vm::take(&fake_vm::log_lines);
     }
     void TearDown() override {
         EXPECT_EQ(deinit(), 0);
@@ -82,25 +86,25 @@ TEST(JniFirstCalls, EachIsHarmlessAndMakesWhatItNeeds) {
     fake_vm::reset();
     TAVO_INFO info = {};
     tavocallback(&info);  // no virtual machine
-    EXPECT_EQ(fake_vm::take_log(), kNotAttached);
+    EXPECT_EQ(fake_vm::take(&fake_vm::log_lines), kNotAttached);
     fake_vm::fail("GetEnv");
-    EXPECT_EQ(JNI_OnLoad(fake_vm::machine(), nullptr), -1);
-    ASSERT_EQ(JNI_OnLoad(fake_vm::machine(), nullptr), 0x10006);
+    EXPECT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), -1);
+    ASSERT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), 0x10006);
 
     // The callback before init: without a host, without its method, and with both.
     tavocallback(&info);
     setup();
     fake_vm::fail("GetStaticMethodID");
     tavocallback(&info);
-    EXPECT_EQ(fake_vm::take_log(), kNotNotified + kNotNotified);
-    EXPECT_TRUE(fake_vm::take_events().empty());
+    EXPECT_EQ(fake_vm::take(&fake_vm::log_lines), kNotNotified + kNotNotified);
+    EXPECT_TRUE(fake_vm::take(&fake_vm::events).empty());
     tavocallback(&info);
-    EXPECT_EQ(fake_vm::take_log(), "");
-    EXPECT_EQ(fake_vm::take_events().size(), 1u);
+    EXPECT_EQ(fake_vm::take(&fake_vm::log_lines), "");
+    EXPECT_EQ(fake_vm::take(&fake_vm::events).size(), 1u);
 
     EXPECT_EQ(analyze(), 0);
     EXPECT_EQ(deinit(), 0);
-    EXPECT_EQ(fake_vm::take_log(), kNoInstance);
+    EXPECT_EQ(fake_vm::take(&fake_vm::log_lines), kNoInstance);
     EXPECT_EQ(tavo_jni_mutex, nullptr);
 
     // A lock that is there already is used, not replaced.
@@ -108,14 +112,14 @@ TEST(JniFirstCalls, EachIsHarmlessAndMakesWhatItNeeds) {
     tavo_jni_mutex = own;
     int locked = 0;
     fake_vm::during("GetStringUTFChars", [&] { locked = pthread_mutex_trylock(own); });
-    EXPECT_EQ(init(fake_vm::new_string("/nowhere.wav")), -4);
+    EXPECT_EQ(init(as_string("/nowhere.wav")), -4);
     EXPECT_EQ(locked, EBUSY);
     EXPECT_EQ(tavo_jni_mutex, own);
     tavo_jni_mutex = nullptr;
     delete own;
     EXPECT_EQ(init(nullptr), -4);
     EXPECT_NE(tavo_jni_mutex, nullptr);
-    EXPECT_EQ(fake_vm::take_log(), kUnusable + kUnusable);
+    EXPECT_EQ(fake_vm::take(&fake_vm::log_lines), kUnusable + kUnusable);
     expect_held(2);
 }
 
@@ -137,9 +141,9 @@ TEST_F(Jni, AJobIsOpenedStartedAndEndedOnce) {
     EXPECT_EQ(inside, numbers({-1, -1, kBusy}));
     EXPECT_EQ(deinit(), 0);
     EXPECT_EQ(analyze(), 0);
-    EXPECT_EQ(fake_vm::take_events().size(), 1u);
+    EXPECT_EQ(fake_vm::take(&fake_vm::events).size(), 1u);
 
-    const std::string log = fake_vm::take_log();
+    const std::string log = fake_vm::take(&fake_vm::log_lines);
     const size_t at = log.find("(id:") + 4;
     const std::string id = log.substr(at, log.find(')', at) - at);
     EXPECT_EQ(id.find_first_not_of("0123456789"), std::string::npos);
@@ -186,12 +190,12 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
         setup();
         EXPECT_EQ(init(), opens ? 0 : -4);
         if (opens) call_back_on_a_thread(each.info);
-        EXPECT_EQ(fake_vm::take_log(), each.log);
+        EXPECT_EQ(fake_vm::take(&fake_vm::log_lines), each.log);
         expect_held(2);
         EXPECT_EQ(deinit(), 0);
-        EXPECT_EQ(fake_vm::take_log() == kNoInstance, !opens);
+        EXPECT_EQ(fake_vm::take(&fake_vm::log_lines) == kNoInstance, !opens);
 
-        const std::vector<fake_vm::event> events = fake_vm::take_events();
+        const std::vector<fake_vm::event> events = fake_vm::take(&fake_vm::events);
         ASSERT_EQ(events.size(), each.event.empty() ? 0u : 1u);
         if (events.empty()) continue;
         EXPECT_NE(events[0].object, nullptr);
@@ -214,7 +218,7 @@ TEST_F(Jni, ARepeatedSetupReplacesItsReferences) {
     expect_held(1);
     tavocallback(&info);
 
-    const std::vector<fake_vm::event> events = fake_vm::take_events();
+    const std::vector<fake_vm::event> events = fake_vm::take(&fake_vm::events);
     ASSERT_EQ(events.size(), 3u);
     EXPECT_NE(events[0].object, events[1].object);
     EXPECT_NE(events[1].object, nullptr);
@@ -237,7 +241,7 @@ TEST_F(Jni, ThreadsMayComeTogether) {
     });
     for (int i = 0; i < 200; ++i) call_back_on_a_thread({});
     setups.join();
-    EXPECT_EQ(fake_vm::take_events().size(), 200u);
+    EXPECT_EQ(fake_vm::take(&fake_vm::events).size(), 200u);
 }
 
 }  // namespace
