@@ -8,6 +8,8 @@ std::string format_head(result_format format) {
 
 std::string format_record(result_format format, const record &result) {
     switch (format) {
+        case result_format::none:
+            return "";
         case result_format::text:
             return text_record(result);
         case result_format::json:

@@ -15,6 +15,10 @@ std::string format_record(result_format format, const record &result);
 
 std::string text_record(const record &result);
 std::string json_record(const record &result);
+
+// The record that json_record made the text of, but for the file's name. Throws std::exception for
+// any other text.
+record record_from_json(const std::string &text);
 std::string csv_head();
 std::string csv_record(const record &result);
 

@@ -1,22 +1,14 @@
 #include <cmath>
-#include <nlohmann/json.hpp>
 
 #include "cli/format.h"
+#include "cli/json.h"
 #include "cli/names.h"
 #include "cli/words.h"
-
-namespace {
-
-// Keys in the order they are set; beat times as the single-precision values they are.
-using json = nlohmann::basic_json<nlohmann::ordered_map, std::vector, std::string, bool, int64_t,
-                                  uint64_t, float>;
-
-}  // namespace
 
 // A name that is not UTF-8 cannot stand in JSON: file then has U+FFFD in place of the bytes in
 // question, and file_bytes holds the exact name, percent-encoded.
 std::string json_record(const record &result) {
-    json object;
+    result_json object;
     object["file"] = as_utf8(result.file);
     if (!is_utf8(result.file)) object["file_bytes"] = percent_encoded(result.file);
     object["mode"] = mode_word(result.mode);
@@ -41,4 +33,22 @@ std::string json_record(const record &result) {
     if (result.cpu_ms >= 0) object["cpu_ms"] = result.cpu_ms;
     if (!result.error.empty()) object["error"] = as_utf8(result.error);
     return object.dump() + "\n";
+}
+
+record record_from_json(const std::string &text) {
+    const result_json object = result_json::parse(text);
+    record out =
+        failed_record("", mode_of(object.at("mode").get<std::string>()), object.value("error", ""));
+    if (object.at("status") == status_word(outcome::ok)) out.status = outcome::ok;
+    out.has_stream = object.contains("sample_rate");
+    out.sample_rate = object.value("sample_rate", 0);
+    out.channels = object.value("channels", 0);
+    out.duration_ms = object.value("duration_ms", int64_t{0});
+    out.has_highlight = object.contains("hl_pos_ms");
+    out.hl_pos_ms = object.value("hl_pos_ms", 0);
+    out.has_beats = object.contains("bpm");
+    out.bpm = object.value("bpm", 0);
+    if (out.has_beats) out.beats_ms = object.at("beats_ms").get<std::vector<float>>();
+    out.cpu_ms = object.value("cpu_ms", int64_t{-1});
+    return out;
 }

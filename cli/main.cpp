@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <exception>
 
+#include "cli/forecast.h"
 #include "cli/options.h"
 #include "cli/stop.h"
 #include "cli/workers.h"
@@ -27,7 +28,7 @@ int run(int argc, char **argv) {
         perror("tavo");
         return kExitFailed;
     }
-    return run_workers(opts);
+    return opts.forecast.empty() ? run_workers(opts, {}) : run_forecast(opts);
 }
 
 }  // namespace

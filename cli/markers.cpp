@@ -25,22 +25,6 @@ const marker_format *find_format(result_format format) {
     return nullptr;
 }
 
-// FNV-1a
-uint32_t hash_of(const std::string &bytes) {
-    uint32_t hash = 2'166'136'261u;
-    for (const char byte : bytes) hash = (hash ^ static_cast<uint8_t>(byte)) * 16'777'619u;
-    return hash;
-}
-
-std::string fitting_name(const std::string &name, const std::string &suffix) {
-    if (name.size() + suffix.size() <= NAME_MAX) return name + suffix;
-    std::array<char, 16> number{};
-    snprintf(number.data(), number.size(), "~%08x", hash_of(name));
-    size_t kept = NAME_MAX - suffix.size() - 9;
-    while (kept > 0 && (static_cast<uint8_t>(name[kept]) & 0xC0) == 0x80) --kept;  // in a character
-    return name.substr(0, kept) + number.data() + suffix;
-}
-
 }  // namespace
 
 bool writes_files(result_format format) {

@@ -1,6 +1,9 @@
 #include "cli/names.h"
 
+#include <array>
+#include <climits>
 #include <cstdint>
+#include <cstdio>
 #include <cstring>
 
 namespace {
@@ -38,6 +41,13 @@ void add_hex(std::string &out, const char *before, uint8_t byte) {
 // The control characters of C1, two bytes in UTF-8: terminals obey them.
 bool is_c1_control(const std::string &bytes, size_t i) {
     return byte_at(bytes, i) == 0xC2 && byte_at(bytes, i + 1) < 0xA0;
+}
+
+// FNV-1a
+uint32_t hash_of(const std::string &bytes) {
+    uint32_t hash = 2'166'136'261u;
+    for (const char byte : bytes) hash = (hash ^ static_cast<uint8_t>(byte)) * 16'777'619u;
+    return hash;
 }
 
 }  // namespace
@@ -107,4 +117,13 @@ std::string percent_encoded(const std::string &bytes) {
 std::string base_name(const std::string &path) {
     const size_t slash = path.rfind('/');
     return slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+std::string fitting_name(const std::string &name, const std::string &suffix) {
+    if (name.size() + suffix.size() <= NAME_MAX) return name + suffix;
+    std::array<char, 16> number{};
+    snprintf(number.data(), number.size(), "~%08x", hash_of(name));
+    size_t kept = NAME_MAX - suffix.size() - 9;
+    while (kept > 0 && (static_cast<uint8_t>(name[kept]) & 0xC0) == 0x80) --kept;  // in a character
+    return name.substr(0, kept) + number.data() + suffix;
 }

@@ -18,4 +18,8 @@ std::string percent_encoded(const std::string &bytes);
 
 std::string base_name(const std::string &path);
 
+// name and suffix as one file's name. One that would get too long for a file system ends in a
+// number made from the whole name instead.
+std::string fitting_name(const std::string &name, const std::string &suffix);
+
 #endif

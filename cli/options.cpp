@@ -9,6 +9,7 @@
 #include <iostream>
 
 #include "cli/markers.h"
+#include "cli/words.h"
 #include "core/tavo.h"
 
 namespace {
@@ -46,7 +47,8 @@ int wrong_usage(const std::string &sentence) {
 // Values that the parser takes as words.
 struct raw_values {
     std::string mode = "both";
-    std::string format = "text";
+    std::string format;  // empty: text, or none with a store
+    std::string shard;
     bool null_separated = false;
 };
 
@@ -125,7 +127,50 @@ void declare_output(CLI::App &app, options &out, raw_values &raw) {
                    "Draw the result, an SVG file: waveform, loudness,\nhighlight and beats; one "
                    "input only")
         ->type_name("SVG");
+    app.add_option("--report", out.report,
+                   "Write a page that shows and plays the song, an HTML file;\nfor several inputs "
+                   "an index, the pages in a folder beside it")
+        ->type_name("HTML");
+    app.add_flag("--embed", out.embed, "Put the sound into the page");
     app.add_flag("-q,--quiet", out.quiet, "No progress bar and no notes");
+}
+
+void declare_catalogue(CLI::App &app, options &out, raw_values &raw) {
+    app.add_option("--store", out.store,
+                   "Keep the results in a database: sqlite:FILE, FILE.db or\n"
+                   "postgresql://HOST/DATABASE. Songs that it knows are left\nout; standard output "
+                   "is used only with --format")
+        ->type_name("URL");
+    app.add_flag("--retry-failed", out.retry_failed, "Analyse songs again that failed");
+    app.add_flag("--redo", out.redo, "Analyse every song again");
+    app.add_flag("--from-store", out.from_store,
+                 "Write out what the store holds for --mode, --length and\n--max-beats; analyses "
+                 "nothing");
+    app.add_option("--patience", out.patience_s,
+                   "How long a store that does not answer is tried again;\n60 by default")
+        ->check(whole(0, kMostSeconds, " of seconds"))
+        ->type_name("SECONDS");
+    app.add_option("--shard", raw.shard,
+                   "Only the share I of N of the inputs, for engines that run\none command many "
+                   "times; auto: as Slurm, Kubernetes or\nAWS Batch says")
+        ->type_name("I/N");
+    app.add_option("--forecast", out.forecast,
+                   "Analyse a random sample of a list and say what all of it\nneeds")
+        ->type_name("LIST");
+    app.add_option("--sample", out.sample, "Files in the sample; 1000 by default")
+        ->check(whole(2, kMostBeats, ""))
+        ->type_name("N");
+    app.add_option("--files", out.forecast_files,
+                   "Forecast for so many files instead of the list's")
+        ->check(whole(1, kMostBeats, ""))
+        ->type_name("N");
+    app.add_option("--cores", out.cores, "Processors to forecast for; 1 by default")
+        ->check(whole(1, kMostBeats, ""))
+        ->type_name("N");
+    app.add_option("--bandwidth", out.bandwidth,
+                   "Speed of the storage to forecast for; 100 by default")
+        ->check(whole(1, kMostBeats, ""))
+        ->type_name("MB/S");
 }
 
 void declare_inputs(CLI::App &app, options &out, raw_values &raw) {
@@ -146,31 +191,43 @@ bool is_folder(const std::string &path) {
 }
 
 void set_values(const raw_values &raw, options &out) {
-    out.mode = raw.mode == "highlight" ? TAVO_MODE_HIGHLIGHT
-               : raw.mode == "beats"   ? TAVO_MODE_BEATS
-                                       : TAVO_MODE_BOTH;
-    out.format = raw.format == "json"     ? result_format::json
-                 : raw.format == "csv"    ? result_format::csv
-                 : raw.format == "labels" ? result_format::labels
-                                          : result_format::text;
-    unshield(out.click);
-    unshield(out.plot);
+    out.mode = mode_of(raw.mode);
+    out.format = raw.format == "json"                       ? result_format::json
+                 : raw.format == "csv"                      ? result_format::csv
+                 : raw.format == "labels"                   ? result_format::labels
+                 : raw.format.empty() && !out.store.empty() ? result_format::none
+                                                            : result_format::text;
+    for (std::string *path : {&out.click, &out.plot, &out.report, &out.store, &out.forecast}) {
+        unshield(*path);
+    }
     unshield(out.output_dir);
     for (std::string &input : out.inputs) unshield(input);
     for (std::string &list : out.lists) unshield(list);
     if (raw.null_separated) out.list_separator = '\0';
 }
 
-bool takes_one_file(const options &out) {
-    return out.inputs.size() == 1 && out.inputs[0] != "-" && out.lists.empty() &&
-           !is_folder(out.inputs[0]);
+// What is wrong with the options about the store and the forecast.
+std::string catalogue_contradiction(const options &out) {
+    const bool nothing_named = out.inputs.empty() && out.lists.empty();
+    if (out.store.empty() && (out.from_store || out.redo || out.retry_failed)) {
+        return "--from-store, --redo and --retry-failed are about a --store.";
+    }
+    if (out.redo && out.retry_failed) return "--redo analyses failed songs too.";
+    if ((out.from_store || !out.forecast.empty()) && !nothing_named) {
+        return std::string(out.from_store ? "--from-store" : "--forecast") +
+               " takes no other inputs.";
+    }
+    if (out.from_store && out.format == result_format::none && out.report.empty()) {
+        return "--from-store needs --format or --report.";
+    }
+    return "";
 }
 
 // What is wrong with options that are right by themselves. Empty when all is well.
 std::string contradiction(const options &out, bool null_separated) {
     const bool list_on_stdin =
         std::find(out.inputs.begin(), out.inputs.end(), "-") != out.inputs.end();
-    if (out.inputs.empty() && out.lists.empty()) {
+    if (out.inputs.empty() && out.lists.empty() && !out.from_store && out.forecast.empty()) {
         return "name at least one audio file, a folder, or '-' for a list on standard input.";
     }
     if (null_separated && !list_on_stdin && out.lists.empty()) {
@@ -189,12 +246,16 @@ std::string contradiction(const options &out, bool null_separated) {
     if (!out.click.empty() && out.mode == TAVO_MODE_HIGHLIGHT) {
         return "--click needs beats: --mode beats or both.";
     }
+    if (out.embed && out.report.empty()) return "--embed is about --report.";
     if (!out.click.empty() && out.click == out.plot) return "--click and --plot name one file.";
+    if (!out.report.empty() && (out.report == out.plot || out.report == out.click)) {
+        return "--report names the file of another option.";
+    }
     if ((!out.click.empty() || !out.plot.empty()) && !takes_one_file(out)) {
         return std::string(out.click.empty() ? "--plot" : "--click") +
                " takes exactly one audio file.";
     }
-    return "";
+    return catalogue_contradiction(out);
 }
 
 // Says which options do other than a newcomer may expect.
@@ -223,6 +284,7 @@ std::optional<int> parse_options(int argc, char **argv, options &out) {
     declare_inputs(app, out, raw);
     declare_analysis(app, out, raw);
     declare_output(app, out, raw);
+    declare_catalogue(app, out, raw);
     try {
         app.parse(shielded(argc, argv));
     } catch (const CLI::Success &done) {
@@ -234,8 +296,14 @@ std::optional<int> parse_options(int argc, char **argv, options &out) {
         return wrong_usage(wrong.what());
     }
     set_values(raw, out);
-    const std::string sentence = contradiction(out, raw.null_separated);
+    std::string sentence = contradiction(out, raw.null_separated);
+    if (sentence.empty() && !raw.shard.empty()) sentence = read_shard(raw.shard, out.share);
     if (!sentence.empty()) return wrong_usage(sentence);
     write_notes(out);
     return std::nullopt;
+}
+
+bool takes_one_file(const options &opts) {
+    return opts.inputs.size() == 1 && opts.inputs[0] != "-" && opts.lists.empty() &&
+           !is_folder(opts.inputs[0]);
 }

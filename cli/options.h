@@ -7,7 +7,9 @@
 #include <string>
 #include <vector>
 
-enum class result_format { text, json, csv, labels };
+#include "cli/shard.h"
+
+enum class result_format { none, text, json, csv, labels };
 
 struct options {
     int32_t mode = 0;       // TAVO_MODE_*
@@ -16,10 +18,23 @@ struct options {
     result_format format = result_format::text;
     std::string click;       // where the click track goes, empty for none
     std::string plot;        // where the picture goes, empty for none
+    std::string report;      // where the page goes, empty for none
+    bool embed = false;      // the sound goes into the page
     std::string output_dir;  // of marker files; empty: beside each input
     bool force = false;
     bool skip_existing = false;
     bool quiet = false;
+    std::string store;        // URL of the database, empty for none
+    bool from_store = false;  // its results are written out, nothing is analysed
+    bool retry_failed = false;
+    bool redo = false;
+    int32_t patience_s = 60;  // how long a database that is away is asked again
+    shard share;
+    std::string forecast;        // a list to take a sample of, empty for none
+    int32_t sample = 1000;       // files in it
+    int64_t forecast_files = 0;  // the number to forecast for, 0 for the list's
+    int32_t cores = 1;
+    int32_t bandwidth = 100;  // MB/s
     bool recursive = false;
     int32_t jobs = 1;
     char list_separator = '\n';       // of the lists that name files
@@ -34,5 +49,8 @@ constexpr int kExitSignal = 128;  // plus the number of the signal that stopped 
 
 // Returns the exit status when the command is done already (help, version, wrong usage).
 std::optional<int> parse_options(int argc, char **argv, options &out);
+
+// Whether the one input is a file, neither a folder nor a list.
+bool takes_one_file(const options &opts);
 
 #endif

@@ -23,8 +23,16 @@ void write_result(ordered_output &out, const std::string &text) {
     }
 }
 
+// A part of the index could not be written.
+void note_index_error(ordered_output &out, const std::string &error) {
+    if (error.empty()) return;
+    out.a_file_failed = true;
+    write_message(out, "tavo: " + error + "\n");
+}
+
 void write_reply(ordered_output &out, const reply &made) {
     if (made.status == outcome::stopped) return;
+    note_index_error(out, add_report_row(out.index, made.row));
     if (made.status == outcome::failed) out.a_file_failed = true;
     write_result(out, made.result);
     if (!output_failed(out)) write_message(out, made.message);
@@ -32,13 +40,14 @@ void write_reply(ordered_output &out, const reply &made) {
 
 }  // namespace
 
-ordered_output start_output(const options &opts) {
-    ordered_output out;
+std::string start_output(ordered_output &out, const options &opts) {
+    const std::string error = begin_report_index(out.index, opts);
+    if (!error.empty()) return "tavo: " + error + "\n";
     struct stat info {};
     out.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
     out.bar = start_progress(opts.quiet);
     write_result(out, format_head(opts.format));
-    return out;
+    return "";
 }
 
 void set_total(ordered_output &out, size_t total) {
@@ -79,8 +88,9 @@ void redraw(ordered_output &out) {
     draw_progress(out.bar, out.done);
 }
 
-int finish_output(ordered_output &out, bool unclean) {
+int finish_output(ordered_output &out, const options &opts, bool unclean) {
     clear_progress(out.bar);
+    note_index_error(out, finish_report_index(out.index, opts));
     if (out.write_error != 0) {
         write_message(
             out,

@@ -10,6 +10,7 @@
 
 #include "cli/options.h"
 #include "cli/progress.h"
+#include "cli/report.h"
 #include "cli/worker.h"
 
 struct ordered_output {
@@ -20,11 +21,13 @@ struct ordered_output {
     bool a_file_failed = false;
     bool reader_gone = false;  // standard output was closed by its reader, with results to come
     int write_error = 0;       // errno of any other failure on standard output
-    bool to_pipe = false;      // standard output is a pipe, whose reader may go
+    report_index index;
+    bool to_pipe = false;  // standard output is a pipe, whose reader may go
     progress bar;
 };
 
-ordered_output start_output(const options &opts);
+// Returns an empty string or, when the report's index cannot be begun, lines for standard error.
+std::string start_output(ordered_output &out, const options &opts);
 void set_total(ordered_output &out, size_t total);  // once all inputs are known
 void accept_reply(ordered_output &out, size_t index, reply &&made);
 void write_message(ordered_output &out, const std::string &text);
@@ -34,8 +37,8 @@ bool output_failed(const ordered_output &out);
 int redraw_timeout_ms(const ordered_output &out);  // for poll: -1 when there is no line
 void redraw(ordered_output &out);
 
-// After the last reply: says what went wrong with the output and that the work was stopped, if it
-// was. Returns the exit status.
-int finish_output(ordered_output &out, bool unclean);
+// After the last reply: finishes the report's index, says what went wrong with the output and that
+// the work was stopped, if it was. Returns the exit status.
+int finish_output(ordered_output &out, const options &opts, bool unclean);
 
 #endif

@@ -108,3 +108,12 @@ void abandon_output(output_file &file) {
     if (!file.temporary.empty()) unlink(file.temporary.c_str());
     file.temporary.clear();
 }
+
+std::string write_file(const std::string &target, const std::string &content, bool force) {
+    output_file file;
+    std::string error = begin_output(file, target);
+    if (error.empty()) error = write_output(file, content);
+    if (error.empty()) error = commit_output(file, force);
+    abandon_output(file);
+    return error;
+}

@@ -29,4 +29,7 @@ std::string commit_output(output_file &file, bool force);
 // Removes what is left. Harmless after a commit and when called twice.
 void abandon_output(output_file &file);
 
+// All of the above.
+std::string write_file(const std::string &target, const std::string &content, bool force);
+
 #endif

@@ -17,15 +17,9 @@ std::string check_plot(const std::string &target, const std::string &input, bool
 void draw_plot(record &result, const options &opts, int stop_fd) {
     plot_data data;
     std::string error;
-    const outcome read = gather_plot(result, stop_fd, data, error);
-    if (read == outcome::ok) {
-        output_file file;
-        error = begin_output(file, opts.plot);
-        if (error.empty()) error = write_output(file, plot_svg(result, data));
-        if (error.empty()) error = commit_output(file, opts.force);
-        abandon_output(file);
-        if (error.empty()) return;
-    }
+    const outcome read = gather_plot(result, kPlotColumns, stop_fd, data, error);
+    if (read == outcome::ok) error = write_file(opts.plot, plot_svg(result, data), opts.force);
+    if (error.empty()) return;
     result = failed_record(result.file, result.mode, error);
     if (read == outcome::stopped) result.status = outcome::stopped;
 }

@@ -38,8 +38,10 @@ std::string check_plot(const std::string &target, const std::string &input, bool
 void draw_plot(record &result, const options &opts, int stop_fd);
 
 // Reads the sound of result.file once, from its start. Memory does not grow with the sound, but for
-// the loudness: 4 bytes each 2 s. Where reading fails it ends. stop_fd as for analyse.
-outcome gather_plot(const record &result, int stop_fd, plot_data &out, std::string &error);
+// the loudness: 4 bytes each 2 s. Where reading fails it ends. columns: of the waveform. stop_fd as
+// for analyse.
+outcome gather_plot(const record &result, int columns, int stop_fd, plot_data &out,
+                    std::string &error);
 
 // The whole SVG document, UTF-8.
 std::string plot_svg(const record &result, const plot_data &data);

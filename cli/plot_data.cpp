@@ -115,10 +115,10 @@ outcome read_sound(const std::string &path, int32_t rate, int stop_fd, reading &
 }
 
 // Each column takes every bin that it touches.
-std::vector<extent> columns_of(const bins &from, double axis_samples) {
+std::vector<extent> columns_of(const bins &from, double axis_samples, int columns) {
     std::vector<extent> out;
-    const double bins_each = axis_samples / kPlotColumns / static_cast<double>(from.samples_each);
-    for (int k = 0; k < kPlotColumns; ++k) {
+    const double bins_each = axis_samples / columns / static_cast<double>(from.samples_each);
+    for (int k = 0; k < columns; ++k) {
         const auto first = static_cast<size_t>(k * bins_each);
         if (first >= from.full.size()) break;
         const auto end = static_cast<size_t>(std::ceil((k + 1) * bins_each));
@@ -131,13 +131,14 @@ std::vector<extent> columns_of(const bins &from, double axis_samples) {
     return out;
 }
 
-void fill_plot(const record &result, const reading &from, int32_t rate, plot_data &out) {
+void fill_plot(const record &result, const reading &from, int columns, plot_data &out) {
+    const int32_t rate = result.sample_rate;
     out.read_ms = 1000.0 * static_cast<double>(from.samples) / rate;
     out.length_ms = std::max(out.read_ms, static_cast<double>(result.hl_pos_ms));
     for (const float beat : result.beats_ms) {
         out.length_ms = std::max(out.length_ms, static_cast<double>(beat));
     }
-    out.waveform = columns_of(from.waveform, out.length_ms * rate / 1000.0);
+    out.waveform = columns_of(from.waveform, out.length_ms * rate / 1000.0, columns);
     for (const extent &column : out.waveform) {
         out.peak = std::max(
             {out.peak, -static_cast<int32_t>(column.low), static_cast<int32_t>(column.high)});
@@ -150,7 +151,8 @@ void fill_plot(const record &result, const reading &from, int32_t rate, plot_dat
 
 }  // namespace
 
-outcome gather_plot(const record &result, int stop_fd, plot_data &out, std::string &error) {
+outcome gather_plot(const record &result, int columns, int stop_fd, plot_data &out,
+                    std::string &error) {
     reading from;
     library_path opened = open_library_path(result.file);
     const outcome end = read_sound(opened.path, result.sample_rate, stop_fd, from);
@@ -163,6 +165,6 @@ outcome gather_plot(const record &result, int stop_fd, plot_data &out, std::stri
         error = "The sound could not be read again for the picture.";
         return outcome::failed;
     }
-    fill_plot(result, from, result.sample_rate, out);
+    fill_plot(result, from, columns, out);
     return outcome::ok;
 }

@@ -20,6 +20,11 @@ const char *mode_word(int32_t mode) {
     }
 }
 
+int32_t mode_of(const std::string &word) {
+    if (word == "highlight") return TAVO_MODE_HIGHLIGHT;
+    return word == "beats" ? TAVO_MODE_BEATS : TAVO_MODE_BOTH;
+}
+
 const char *status_word(outcome status) {
     switch (status) {
         case outcome::ok:

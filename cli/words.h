@@ -9,6 +9,7 @@
 
 // Words of the interface: highlight, beats, both; ok, failed, stopped.
 const char *mode_word(int32_t mode);
+int32_t mode_of(const std::string &word);  // TAVO_MODE_*; the words' inverse
 const char *status_word(outcome status);
 
 // m:ss.t, or h:mm:ss.t from an hour on; without tenths where the time is a whole second anyway.

@@ -1,9 +1,10 @@
 // A worker process: files in, finished texts out. The library holds one instance a process, so
 // this is what makes several analyses at once possible, and what keeps a crash to its own file.
 //
-// Between the command and a worker run two pipes. A request is a request_head and a path, sent only
-// while the worker has none; the end of the request pipe stops a running analysis and the worker.
-// A reply is a reply_head and its two texts.
+// Between the command and a worker run two pipes. A request is a request_head, a path and, for a
+// song that the store knows, its result as JSON; it is sent only while the worker has none. The end
+// of the request pipe stops a running analysis and the worker. A reply is a reply_head and its
+// texts.
 #ifndef TAVO_CLI_WORKER_H
 #define TAVO_CLI_WORKER_H
 
@@ -14,22 +15,31 @@
 #include "cli/record.h"
 
 struct request_head {
-    uint64_t index;       // of the input
-    uint64_t path_bytes;  // follow the head
+    uint64_t index;           // of the input
+    uint64_t path_bytes;      // follow the head
+    uint64_t recalled_bytes;  // follow the path
 };
 
 struct reply_head {
     uint64_t index;  // of the input
     outcome status;
-    uint32_t result_bytes;   // follow the head
-    uint32_t message_bytes;  // follow the result
+    uint32_t text_bytes[4];  // of the reply's texts, which follow the head in their order
 };
 
 struct reply {
     outcome status = outcome::failed;
     std::string result;   // for standard output
     std::string message;  // for standard error
+    std::string json;     // the result for the store and the forecast, where there is one
+    std::string row;      // of the report's index, where there is one
 };
+
+// The texts in the order in which they are sent.
+constexpr std::string reply::*kReplyTexts[] = {&reply::result, &reply::message, &reply::json,
+                                               &reply::row};
+
+// Whether replies carry the result as JSON.
+bool needs_json(const options &opts);
 
 reply make_reply(const record &result, const options &opts);
 

@@ -4,15 +4,18 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
 #include <deque>
+#include <iterator>
 #include <vector>
 
 #include "cli/inputs.h"
 #include "cli/ordered_output.h"
 #include "cli/stop.h"
+#include "cli/store/keeper.h"
 #include "cli/words.h"
 #include "cli/worker.h"
 
@@ -25,6 +28,8 @@ constexpr size_t kMostWaiting = 1'000;  // results kept back for an earlier one
 struct numbered_input {
     size_t index;
     input entry;
+    file_state file;       // for the store
+    std::string recalled;  // the result as JSON, when the store gave it
 };
 
 struct process {
@@ -43,6 +48,8 @@ struct worker_pool {
     std::deque<numbered_input> queue;
     size_t count;  // inputs found so far
     ordered_output output;
+    store_keeper keeper;
+    const reply_sink &sink;
     std::vector<process> processes;
     bool ending;   // nothing is handed out any more
     bool unclean;  // a worker without a file ended badly
@@ -91,25 +98,54 @@ int start_process(worker_pool &pool) {
     return 0;
 }
 
+void take_result(worker_pool &pool, const numbered_input &asked, reply &&made) {
+    if (asked.recalled.empty()) {
+        write_message(pool.output,
+                      keep_result(pool.keeper, asked.entry.path, asked.file, made.json));
+    }
+    if (pool.sink) pool.sink(asked.entry.path, made);
+    accept_reply(pool.output, asked.index, std::move(made));
+}
+
 void fail_input(worker_pool &pool, const numbered_input &failed, const std::string &error) {
     const record result = failed_record(failed.entry.path, pool.opts.mode, error);
-    accept_reply(pool.output, failed.index, make_reply(result, pool.opts));
+    take_result(pool, failed, make_reply(result, pool.opts));
 }
 
 bool may_search(const worker_pool &pool) {
     return !pool.ending && pool.found != supply_state::ended && pool.queue.size() < kMostAhead;
 }
 
+// The next input of the command line, or of the store that it names.
+supply_state find_next(worker_pool &pool, numbered_input &next) {
+    if (!pool.opts.from_store) return next_input(pool.supply, next.entry);
+    std::string message;
+    const bool found = next_stored(pool.keeper, next.entry.path, next.recalled, message);
+    write_message(pool.output, message);
+    return found ? supply_state::ready : supply_state::ended;
+}
+
+// Whether the input is this command's to analyse, and is not stored yet.
+bool is_wanted(worker_pool &pool, numbered_input &next) {
+    if (!in_shard(pool.opts.share, next.entry.path)) return false;
+    if (pool.opts.from_store || !next.entry.error.empty()) return true;
+    std::string message;
+    const bool wanted = wants_song(pool.keeper, pool.opts, next.entry.path, next.file, message);
+    write_message(pool.output, message);
+    return wanted;
+}
+
 // Finds a few more inputs, unless enough are waiting.
 void search_inputs(worker_pool &pool) {
     for (size_t i = 0; i < kFoundAtOnce && may_search(pool); ++i) {
         numbered_input next;
-        pool.found = next_input(pool.supply, next.entry);
+        pool.found = find_next(pool, next);
         if (pool.found == supply_state::waiting) break;
         if (pool.found == supply_state::ended) {
             set_total(pool.output, pool.count);
             break;
         }
+        if (!is_wanted(pool, next)) continue;
         next.index = pool.count++;
         pool.queue.push_back(std::move(next));
     }
@@ -125,9 +161,9 @@ process *find_idle(worker_pool &pool) {
 }
 
 void send_request(process &worker, numbered_input &&next) {
-    const request_head head = {next.index, next.entry.path.size()};
+    const request_head head = {next.index, next.entry.path.size(), next.recalled.size()};
     std::string sent(reinterpret_cast<const char *>(&head), sizeof head);
-    sent += next.entry.path;
+    sent += next.entry.path + next.recalled;
     worker.busy = true;
     worker.asked = std::move(next);
     // A worker that died meanwhile shows at its reply pipe's end.
@@ -197,15 +233,19 @@ void take_reply(worker_pool &pool, process &worker) {
     reply_head head{};
     if (worker.received.size() < sizeof head) return;
     memcpy(&head, worker.received.data(), sizeof head);
-    const size_t size = sizeof head + head.result_bytes + head.message_bytes;
+    size_t size = sizeof head;
+    for (const uint32_t bytes : head.text_bytes) size += bytes;
     if (worker.received.size() < size) return;
     reply made;
     made.status = head.status;
-    made.result = worker.received.substr(sizeof head, head.result_bytes);
-    made.message = worker.received.substr(sizeof head + head.result_bytes, head.message_bytes);
+    size_t at = sizeof head;
+    for (size_t i = 0; i < std::size(kReplyTexts); ++i) {
+        made.*kReplyTexts[i] = worker.received.substr(at, head.text_bytes[i]);
+        at += head.text_bytes[i];
+    }
     worker.received.erase(0, size);
     worker.busy = false;
-    accept_reply(pool.output, head.index, std::move(made));
+    take_result(pool, worker.asked, std::move(made));
 }
 
 void read_from(worker_pool &pool, process &worker) {
@@ -230,6 +270,11 @@ void remove_buried(worker_pool &pool) {
     pool.processes.resize(kept);
 }
 
+// Of two times for poll, where -1 is for ever.
+int shorter_wait(int a, int b) {
+    return a < 0 || b < 0 ? std::max(a, b) : std::min(a, b);
+}
+
 // Waits for whatever comes next: replies, names in a list, a stop, the reader of the results gone.
 // Returns at once while there are inputs to be found.
 void wait_and_serve(worker_pool &pool) {
@@ -240,7 +285,9 @@ void wait_and_serve(worker_pool &pool) {
     watched.push_back({pool.output.to_pipe && !pool.ending ? STDOUT_FILENO : -1, 0, 0});
     watched.push_back({listening ? supply_fd(pool.supply) : -1, POLLIN, 0});
     for (const process &worker : pool.processes) watched.push_back({worker.reply_fd, POLLIN, 0});
-    const int timeout = searching ? 0 : redraw_timeout_ms(pool.output);
+    const int timeout =
+        searching ? 0
+                  : shorter_wait(redraw_timeout_ms(pool.output), keeper_timeout_ms(pool.keeper));
     if (poll(watched.data(), watched.size(), timeout) > 0) {
         if ((watched[1].revents & POLLERR) != 0) note_reader_gone(pool.output);
         for (size_t i = 0; i < pool.processes.size(); ++i) {
@@ -248,6 +295,7 @@ void wait_and_serve(worker_pool &pool) {
         }
         remove_buried(pool);
     }
+    write_message(pool.output, keep_time(pool.keeper));
     redraw(pool.output);
 }
 
@@ -260,18 +308,22 @@ bool is_busy(const worker_pool &pool) {
 
 }  // namespace
 
-int run_workers(const options &opts) {
-    worker_pool pool{opts,  {opts}, supply_state::ready, {}, 0, start_output(opts), {},
-                     false, false};
+int run_workers(const options &opts, const reply_sink &sink) {
+    worker_pool pool{opts, {opts}, supply_state::ready, {}, 0, {}, {}, sink, {}, false, false};
+    std::string message = open_keeper(pool.keeper, opts);
+    if (message.empty()) message = start_output(pool.output, opts);
+    write_message(pool.output, message);
+    if (!message.empty()) return kExitFailed;
     while (true) {
         search_inputs(pool);
         hand_out(pool);
-        const bool stop = stop_requested() || output_failed(pool.output);
+        const bool stop = stop_requested() || output_failed(pool.output) || pool.keeper.failed;
         const bool exhausted = pool.found == supply_state::ended && pool.queue.empty();
         // Only a stop may reach workers that still have a file.
         if (!pool.ending && (stop || (exhausted && !is_busy(pool)))) tell_to_end(pool);
         if (pool.processes.empty() && pool.ending) break;
         wait_and_serve(pool);
     }
-    return finish_output(pool.output, pool.unclean);
+    write_message(pool.output, close_keeper(pool.keeper, opts));
+    return finish_output(pool.output, opts, pool.unclean || pool.keeper.failed);
 }

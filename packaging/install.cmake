@@ -28,6 +28,10 @@ install(FILES ${CMAKE_BINARY_DIR}/packaging/tavo.pc DESTINATION ${CMAKE_INSTALL_
 
 if(TARGET tavo_command)
   install(TARGETS tavo_command DESTINATION ${CMAKE_INSTALL_BINDIR})
+  if(TARGET tavo_postgresql)  # the command loads it
+    install(TARGETS tavo_postgresql DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)
+  endif()
+  install(DIRECTORY packaging/cluster DESTINATION ${CMAKE_INSTALL_DOCDIR})
   install(FILES packaging/tavo.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
   install(FILES packaging/tavo.bash RENAME tavo
     DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)

@@ -17,15 +17,18 @@ _tavo() {
     case $before in
         -m | --mode) mapfile -t COMPREPLY < <(compgen -W 'highlight beats both' -- "$word") ;;
         -f | --format) mapfile -t COMPREPLY < <(compgen -W 'text json csv labels' -- "$word") ;;
+        --shard) mapfile -t COMPREPLY < <(compgen -W 'auto' -- "$word") ;;
         -o | --output-dir) mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
-        -l | --length | -j | --jobs | --max-beats) ;; # a number
-        --click | --plot | --files-from) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
+        -l | --length | -j | --jobs | --max-beats | --patience | --sample | --files | --cores | --bandwidth) ;; # a number
+        --click | --plot | --report | --files-from | --store | --forecast) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
         *)
             if [[ $word == -* ]]; then
                 mapfile -t COMPREPLY < <(compgen -W '-h --help --version
                     -m --mode -l --length --max-beats -j --jobs
-                    -f --format -o --output-dir --force --skip-existing --click --plot -q --quiet
-                    -r --recursive --files-from -0 --null' -- "$word")
+                    -f --format -o --output-dir --force --skip-existing --click --plot --report --embed -q --quiet
+                    -r --recursive --files-from -0 --null
+                    --store --retry-failed --redo --from-store --patience --shard
+                    --forecast --sample --files --cores --bandwidth' -- "$word")
             else
                 mapfile -t COMPREPLY < <(compgen -f -- "$word")
             fi

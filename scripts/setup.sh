@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# scripts/setup.sh [build|java|tests|fuzz|measure|package]...
+# scripts/setup.sh [build|java|tests|cluster|fuzz|measure|package]...
 # Installs the Debian packages that are missing: build, java, tests and fuzz by default; build alone
 # is enough for the library and the command. Says nothing when none is missing.
 set -euo pipefail
@@ -7,15 +7,16 @@ set -euo pipefail
 build=(
   g++ cmake ninja-build pkg-config
   libavcodec-dev libavutil-dev libflac-dev libogg-dev
-  libcli11-dev nlohmann-json3-dev
+  libcli11-dev nlohmann-json3-dev libsqlite3-dev libpq-dev
 )
 java=(default-jdk-headless) # the bridge and the class for Java hosts
 tests=(
   libgtest-dev libbenchmark-dev
-  python3 python3-numpy clang-format clang-tidy
+  python3 python3-numpy python3-selenium chromium chromium-driver sqlite3 clang-format clang-tidy
   ffmpeg flac lame vorbis-tools
   doxygen groff-base
 )
+cluster=(slurm-wlm munge postgresql postgresql-client) # scripts/test-cluster.sh
 fuzz=(clang libclang-rt-14-dev)
 measure=(clang libclang-rt-14-dev gcovr valgrind)
 package=(dpkg-dev file debootstrap) # scripts/test-package.sh
@@ -27,10 +28,11 @@ for group in "${@:-build java tests fuzz}"; do
       build) wanted+=("${build[@]}") ;;
       java) wanted+=("${java[@]}") ;;
       tests) wanted+=("${tests[@]}") ;;
+      cluster) wanted+=("${cluster[@]}") ;;
       fuzz) wanted+=("${fuzz[@]}") ;;
       measure) wanted+=("${measure[@]}") ;;
       package) wanted+=("${package[@]}") ;;
-      *) echo "setup: no group '$name'; groups: build, java, tests, fuzz, measure, package" >&2; exit 2 ;;
+      *) echo "setup: no group '$name'; groups: build, java, tests, cluster, fuzz, measure, package" >&2; exit 2 ;;
     esac
   done
 done

@@ -1,0 +1,352 @@
+"use strict";
+// Draws one song's result on one time axis, in ms, and plays the song.
+const song = JSON.parse(document.getElementById("data").textContent);
+const byId = (id) => document.getElementById(id);
+const beats = song.beats_ms || [];
+const hasHighlight = song.hl_pos_ms !== undefined;
+const loopEnd = hasHighlight ? Math.min(song.region_end_ms, song.length_ms) : 0;
+const timeline = byId("timeline");
+const svg = timeline.querySelector("svg");
+const view = { from: 0, to: song.length_ms };
+
+// m:ss.t, with hours when there are any.
+function clock(ms) {
+  const tenths = Math.max(0, Math.round(ms / 100));
+  const seconds = Math.floor(tenths / 10);
+  const h = Math.floor(seconds / 3600);
+  const m = Math.floor(seconds / 60) % 60;
+  const s = String(seconds % 60).padStart(2, "0") + "." + tenths % 10;
+  return h > 0 ? `${h}:${String(m).padStart(2, "0")}:${s}` : `${m}:${s}`;
+}
+
+function shape(name, attributes) {
+  const made = document.createElementNS("http://www.w3.org/2000/svg", name);
+  for (const key in attributes) made.setAttribute(key, attributes[key]);
+  svg.append(made);
+  return made;
+}
+
+function line(kind, x, top, bottom) {
+  return shape("line", { class: kind, x1: x, x2: x, y1: top, y2: bottom });
+}
+
+// ---- Picture: x is time in ms, y a percentage of the height. Zooming changes the view box only.
+
+function drawWave() {
+  const count = song.wave.length / 2;
+  if (count === 0) return;
+  const step = song.read_ms / count;
+  const y = (value) => (24 - value * 22 / 127).toFixed(2);
+  let path = "";
+  for (let k = 0; k < count; ++k) path += `${k ? "L" : "M"}${((k + .5) * step).toFixed(1)} ${y(song.wave[2 * k + 1])}`;
+  for (let k = count; k-- > 0;) path += `L${((k + .5) * step).toFixed(1)} ${y(song.wave[2 * k])}`;
+  shape("path", { class: "wave", d: path + "Z" });
+}
+
+function drawLoudness() {
+  byId("loudname").hidden = song.loudness.length === 0;
+  const top = Math.max(...song.loudness, song.mean, 1e-9);
+  const y = (value) => (79 - value / top * 29).toFixed(2);
+  // A value stands in the middle of the 6 s that it is about.
+  const points = song.loudness.map((value, k) => `${2000 * k + 3000} ${y(value)}`);
+  if (points.length > 0) {
+    shape("path", { class: "loud", d: "M" + points.join("L") });
+    shape("line", { class: "mean", x1: 0, x2: song.length_ms, y1: y(song.mean), y2: y(song.mean) });
+  }
+}
+
+function draw() {
+  if (hasHighlight) {
+    shape("rect", { class: "region", x: song.hl_pos_ms, y: 0, width: Math.max(0, loopEnd - song.hl_pos_ms), height: 100 });
+  }
+  drawWave();
+  drawLoudness();
+  byId("beatname").hidden = beats.length === 0;
+  for (const beat of beats) line("beat", beat, 83, 98);
+  if (hasHighlight) line("start", song.hl_pos_ms, 0, 100);
+}
+
+const playhead = (draw(), line("head", 0, 0, 100));
+
+function drawTicks() {
+  const steps = [100, 200, 500, 1e3, 2e3, 5e3, 1e4, 15e3, 3e4, 6e4, 12e4, 3e5, 6e5, 9e5, 18e5, 36e5, 72e5];
+  const span = view.to - view.from;
+  const most = Math.max(2, timeline.clientWidth / 75);
+  const step = steps.find((each) => span / each <= most) || span;
+  const ticks = [];
+  for (let t = Math.ceil(view.from / step) * step; t <= view.to; t += step) {
+    const label = document.createElement("span");
+    label.textContent = step < 1000 ? clock(t) : clock(t).replace(/\.\d$/, "");
+    label.style.left = `${Math.min(98, Math.max(2, 100 * (t - view.from) / span))}%`;
+    ticks.push(label);
+  }
+  byId("times").replaceChildren(...ticks);
+}
+
+function show(from, to) {
+  const span = Math.min(Math.max(to - from, 200), song.length_ms);
+  view.from = Math.min(Math.max(from, 0), song.length_ms - span);
+  view.to = view.from + span;
+  svg.setAttribute("viewBox", `${view.from} 0 ${span} 100`);
+  drawTicks();
+}
+
+function zoom(factor, around) {
+  const middle = around === undefined ? player.now() : around;
+  const part = Math.min(Math.max((middle - view.from) / (view.to - view.from), 0), 1);
+  const span = (view.to - view.from) * factor;
+  show(middle - part * span, middle + (1 - part) * span);
+}
+
+function nearestBeat(ms) {
+  return beats.reduce((best, beat) => Math.abs(beat - ms) < Math.abs(best - ms) ? beat : best, beats[0]);
+}
+
+function zoomToBeat() {
+  const beat = nearestBeat(player.now());
+  if (beat !== undefined) show(beat - 1000, beat + 1000);
+}
+
+// ---- Sound. A linked file plays in an audio element: a page from disk cannot route it through an
+// audio context, so the clicks have a context of their own. An embedded file is decoded and plays
+// in the clicks' context: then both are exact to the sample.
+
+let context = null;
+function wake() {
+  context = context || new AudioContext();
+  return context.resume();
+}
+
+const audio = byId("audio");
+const linked = {
+  play: () => audio.play(),
+  pause: () => audio.pause(),
+  seek: (ms) => { audio.currentTime = ms / 1000; },
+  now: () => audio.currentTime * 1000,
+  playing: () => !audio.paused && !audio.ended,
+};
+
+const embedded = {
+  buffer: null, node: null, offset: 0, started: 0, decoding: false,
+  async play() {
+    if (this.decoding) return;
+    if (this.buffer === null) {
+      this.decoding = true;
+      say("Decoding the song …");
+      const text = atob(song.embedded);
+      const bytes = Uint8Array.from(text, (c) => c.charCodeAt(0));
+      this.buffer = await context.decodeAudioData(bytes.buffer).finally(() => { this.decoding = false; });
+      say("");
+    }
+    this.node = new AudioBufferSourceNode(context, { buffer: this.buffer });
+    this.node.connect(context.destination);
+    this.started = context.currentTime;
+    this.node.start(this.started, this.offset);
+  },
+  pause() {
+    this.offset = this.now() / 1000;
+    if (this.node) this.node.stop();
+    this.node = null;
+  },
+  seek(ms) {
+    const running = this.node !== null;
+    this.pause();
+    this.offset = ms / 1000;
+    if (running) this.play();
+  },
+  now() {
+    const seconds = this.node ? this.offset + context.currentTime - this.started : this.offset;
+    return Math.min(1000 * seconds, this.buffer ? 1000 * this.buffer.duration : song.length_ms);
+  },
+  playing() { return this.node !== null && this.now() < 1000 * this.buffer.duration; },
+};
+const player = song.embedded ? embedded : linked;
+if (!song.embedded) audio.src = song.audio;
+
+let scheduled = [];  // click nodes that may still sound
+let clickedTo = 0;   // beats up to here have their click
+
+function dropClicks() {
+  for (const node of scheduled) node.stop();
+  scheduled = [];
+  clickedTo = player.now();
+}
+
+function addClicks(now) {
+  for (const beat of beats) {
+    if (beat < clickedTo || beat < now || beat > now + 300) continue;
+    const at = context.currentTime + (beat - now) / 1000;
+    const gain = new GainNode(context, { gain: .4 });
+    const node = new OscillatorNode(context, { frequency: 1800 });
+    gain.gain.setValueAtTime(.4, at);
+    gain.gain.exponentialRampToValueAtTime(.001, at + .04);
+    node.connect(gain).connect(context.destination);
+    node.start(at);
+    node.stop(at + .05);
+    scheduled.push(node);
+    clickedTo = beat + 1;
+  }
+  scheduled = scheduled.slice(-8);
+}
+
+const pressed = (id) => byId(id).getAttribute("aria-pressed") === "true";
+function press(id, on) { byId(id).setAttribute("aria-pressed", String(on)); }
+function say(words) { byId("status").textContent = words; }
+
+async function togglePlay() {
+  if (player.playing()) {
+    player.pause();
+    dropClicks();
+  } else {
+    try {
+      await wake();
+      if (player.now() >= song.length_ms - 50) player.seek(0);
+      dropClicks();
+      await player.play();
+    } catch (error) {
+      say(song.embedded ? "This browser cannot decode the song." : `The song could not be played from ${decodeURIComponent(song.audio)}.`);
+    }
+  }
+  update();
+}
+
+function seek(ms) {
+  player.seek(Math.min(Math.max(ms, 0), song.length_ms));
+  dropClicks();
+  update();
+}
+
+// ---- Following the playback.
+
+let spoken = -1;
+function update() {
+  const now = player.now();
+  if (pressed("loop") && player.playing() && now >= loopEnd) return seek(song.hl_pos_ms);
+  if (player.playing() && pressed("clicks")) addClicks(now);
+  playhead.setAttribute("x1", now);
+  playhead.setAttribute("x2", now);
+  byId("clock").textContent = `${clock(now)} of ${clock(song.length_ms)}`;
+  byId("play").textContent = player.playing() ? "Pause" : "Play";
+  press("play", player.playing());
+  if (Math.floor(now / 1000) !== spoken) {
+    spoken = Math.floor(now / 1000);
+    timeline.setAttribute("aria-valuenow", spoken);
+    timeline.setAttribute("aria-valuetext", clock(now));
+  }
+  if (player.playing() && pressed("follow") && (now < view.from || now > view.to)) {
+    const span = view.to - view.from;
+    show(now - span / 10, now + span * .9);
+  }
+}
+setInterval(update, 40);
+
+// ---- Controls.
+
+function stepBeat(direction) {
+  const now = player.now();
+  const to = direction > 0 ? beats.find((beat) => beat > now + 30) : beats.filter((beat) => beat < now - 30).pop();
+  if (to !== undefined) seek(to);
+}
+
+function timeAt(event) {
+  const box = svg.getBoundingClientRect();
+  return view.from + (event.clientX - box.left) / box.width * (view.to - view.from);
+}
+
+function toggle(id) {
+  press(id, !pressed(id));
+  if (id === "clicks") dropClicks();
+  if (id === "loop" && pressed(id) && (player.now() < song.hl_pos_ms || player.now() >= loopEnd)) seek(song.hl_pos_ms);
+}
+
+const actions = {
+  play: togglePlay,
+  gohl: () => seek(song.hl_pos_ms),
+  loop: () => toggle("loop"),
+  clicks: () => toggle("clicks"),
+  prev: () => stepBeat(-1),
+  next: () => stepBeat(1),
+  in: () => zoom(.5),
+  out: () => zoom(2),
+  whole: () => show(0, song.length_ms),
+  tobeat: zoomToBeat,
+  follow: () => toggle("follow"),
+};
+const keys = { " ": "play", k: "play", h: "gohl", l: "loop", c: "clicks", ",": "prev", ".": "next", "+": "in", "-": "out", 0: "whole", z: "tobeat", f: "follow" };
+for (const id in actions) byId(id).addEventListener("click", actions[id]);
+
+document.addEventListener("keydown", (event) => {
+  if (event.ctrlKey || event.metaKey || event.altKey) return;
+  const onButton = event.target.closest("button") !== null;
+  if (onButton && (event.key === " " || event.key === "Enter")) return;
+  const moves = { ArrowLeft: -5000, ArrowRight: 5000, PageDown: -30000, PageUp: 30000 };
+  if (event.key in moves && (event.target === timeline || event.key.startsWith("Arrow"))) seek(player.now() + moves[event.key]);
+  else if (event.target === timeline && event.key === "Home") seek(0);
+  else if (event.target === timeline && event.key === "End") seek(song.length_ms);
+  else if (keys[event.key.toLowerCase()] && !byId(keys[event.key.toLowerCase()]).disabled) actions[keys[event.key.toLowerCase()]]();
+  else return;
+  event.preventDefault();
+});
+timeline.addEventListener("pointerdown", (event) => seek(timeAt(event)));
+timeline.addEventListener("pointermove", (event) => { if (event.buttons === 1) seek(timeAt(event)); });
+timeline.addEventListener("wheel", (event) => {
+  if (!event.ctrlKey && event.deltaX === 0) return;
+  event.preventDefault();
+  const span = view.to - view.from;
+  if (event.ctrlKey) zoom(event.deltaY > 0 ? 1.25 : .8, timeAt(event));
+  else show(view.from + event.deltaX * span / 1000, view.to + event.deltaX * span / 1000);
+}, { passive: false });
+addEventListener("resize", drawTicks);
+audio.addEventListener("error", () => say(`The song was not found at ${decodeURIComponent(song.audio)}: play it beside this page, or make the page with --embed.`));
+
+async function copy(words) {
+  try {
+    await navigator.clipboard.writeText(words);
+    say(`${words} copied.`);
+  } catch (error) {
+    say(words);
+  }
+}
+
+function timeButton(ms) {
+  const item = document.createElement("li");
+  const button = document.createElement("button");
+  button.textContent = clock(ms);
+  button.addEventListener("click", () => { seek(ms); copy(clock(ms)); });
+  item.append(button);
+  return item;
+}
+
+function fact(words, value, ms) {
+  const item = document.createElement("li");
+  item.append(words + " ");
+  const strong = document.createElement("b");
+  strong.textContent = value;
+  item.append(strong);
+  if (ms !== undefined) {
+    item.style.cursor = "copy";
+    item.title = "Copy";
+    item.addEventListener("click", () => copy(value));
+  }
+  byId("facts").append(item);
+}
+
+byId("name").textContent = song.name;
+timeline.setAttribute("aria-valuemax", Math.floor(song.length_ms / 1000));
+fact("length", clock(song.duration_ms));
+fact("", `${song.sample_rate} Hz, ${song.channels} ${song.channels === 1 ? "channel" : "channels"}`);
+if (hasHighlight) {
+  const about = song.hl_refined === false ? "about " : "";
+  fact("highlight", about + clock(song.hl_pos_ms) + (song.hl_end_ms === undefined ? "" : ` to ${clock(song.hl_end_ms)}`), song.hl_pos_ms);
+}
+if (song.bpm !== undefined) {
+  fact(song.mode === "both" ? "tempo from the highlight on" : "tempo", `${song.bpm} BPM`);
+  fact("beats", String(beats.length));
+}
+for (const id of ["gohl", "loop"]) byId(id).disabled = !hasHighlight;
+for (const id of ["clicks", "prev", "next", "tobeat"]) byId(id).disabled = beats.length === 0;
+byId("beatlist").hidden = beats.length === 0;
+byId("beattimes").append(...beats.map(timeButton));
+if (song.note) say(song.note);
+show(0, song.length_ms);
+update();

@@ -1,0 +1,112 @@
+#include <libpq-fe.h>
+
+#include <cstdlib>
+#include <memory>
+
+#include "cli/store/database.h"
+
+namespace {
+
+constexpr Oid kBytesOid = 17;  // of the server's types, fixed for all versions
+constexpr Oid kBigintOid = 20;
+constexpr Oid kIntegerOid = 23;
+
+// The server's words in one line.
+std::string sentence(const char *words) {
+    std::string text = words;
+    while (!text.empty() && text.back() == '\n') text.pop_back();
+    for (char &c : text) c = c == '\n' ? ' ' : c;
+    return text;
+}
+
+std::string connect(const std::string &where, void **handle) {
+    PGconn *connection = PQconnectdb(where.c_str());
+    if (PQstatus(connection) != CONNECTION_OK) {
+        const std::string error = sentence(PQerrorMessage(connection));
+        PQfinish(connection);
+        return error;
+    }
+    PQsetNoticeProcessor(
+        connection, [](void *, const char *) {}, nullptr);
+    *handle = connection;
+    return "";
+}
+
+// Values as the protocol takes them: numbers and text as text, bytes as they are.
+struct parameters {
+    std::vector<std::string> texts;
+    std::vector<const char *> values;
+    std::vector<int> lengths;
+    std::vector<int> formats;
+    std::vector<Oid> types;
+};
+
+parameters make_parameters(const row &values) {
+    parameters out;
+    out.texts.reserve(values.size());  // their addresses are kept
+    for (const cell &value : values) {
+        const auto *number = std::get_if<int64_t>(&value);
+        const auto *text = std::get_if<std::string>(&value);
+        const auto *blob = std::get_if<bytes>(&value);
+        out.texts.push_back(number != nullptr ? std::to_string(*number)
+                            : text != nullptr ? *text
+                            : blob != nullptr ? blob->value
+                                              : "");
+        const bool null = std::holds_alternative<std::monostate>(value);
+        out.values.push_back(null ? nullptr : out.texts.back().data());
+        out.lengths.push_back(static_cast<int>(out.texts.back().size()));
+        out.formats.push_back(blob != nullptr ? 1 : 0);
+        out.types.push_back(blob != nullptr ? kBytesOid : 0);
+    }
+    return out;
+}
+
+cell column(const PGresult *result, int line, int index) {
+    if (PQgetisnull(result, line, index) != 0) return std::monostate();
+    const char *text = PQgetvalue(result, line, index);
+    const Oid type = PQftype(result, index);
+    if (type == kBigintOid || type == kIntegerOid) return int64_t{strtoll(text, nullptr, 10)};
+    if (type != kBytesOid) return std::string(text);
+    size_t size = 0;
+    const std::unique_ptr<unsigned char, decltype(&PQfreemem)> raw(
+        PQunescapeBytea(reinterpret_cast<const unsigned char *>(text), &size), PQfreemem);
+    return raw == nullptr ? bytes{}
+                          : bytes{std::string(reinterpret_cast<const char *>(raw.get()), size)};
+}
+
+std::string run(void *handle, const std::string &sql, const row &values,
+                const std::function<void(const row &)> &on_row) {
+    auto *connection = static_cast<PGconn *>(handle);
+    const parameters given = make_parameters(values);
+    const std::unique_ptr<PGresult, decltype(&PQclear)> result(
+        PQexecParams(connection, sql.c_str(), static_cast<int>(values.size()), given.types.data(),
+                     given.values.data(), given.lengths.data(), given.formats.data(), 0),
+        PQclear);
+    const ExecStatusType status = PQresultStatus(result.get());
+    if (status != PGRES_COMMAND_OK && status != PGRES_TUPLES_OK) {
+        return sentence(PQerrorMessage(connection));
+    }
+    for (int line = 0; on_row && line < PQntuples(result.get()); ++line) {
+        row found;
+        for (int i = 0; i < PQnfields(result.get()); ++i) {
+            found.push_back(column(result.get(), line, i));
+        }
+        on_row(found);
+    }
+    return "";
+}
+
+void disconnect(void *handle) {
+    PQfinish(static_cast<PGconn *>(handle));
+}
+
+// An index entry takes a third of a page of 8 KiB.
+constexpr database_kind kPostgresql = {"BYTEA", "TIMESTAMPTZ", "JSON",    2600,
+                                       connect, run,           disconnect};
+
+}  // namespace
+
+// Found by name in the module that this file is.
+extern "C" const database_kind *tavo_postgresql_database() {
+    return &kPostgresql;
+}
