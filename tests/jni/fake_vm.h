@@ -135,8 +135,11 @@ JNINativeInterface_ functions() {
         return hand_out<jmethodID>(&method, succeeds("GetStaticMethodID") && known);
     };
     table.NewGlobalRef = [](JNIEnv *, jobject object) {
-        return hand_out(&now.global_references, succeeds("NewGlobalRef"),
-                        classes.count(object) != 0);
+        const bool given = succeeds("NewGlobalRef");
+        std::unique_lock<std::mutex> hold(lock);
+        const bool is_class = classes.count(object) != 0;
+        hold.unlock();
+        return hand_out(&now.global_references, given, is_class);
     };
     table.GetStringUTFChars = [](JNIEnv *, jstring string, jboolean *) {
         const bool given = hand_out(&now.lent, succeeds("GetStringUTFChars")) != nullptr;
