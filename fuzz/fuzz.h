@@ -5,11 +5,14 @@
 #define TAVO_FUZZ_FUZZ_H
 
 #include <fuzzer/FuzzedDataProvider.h>
+#include <sys/mman.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <string>
 #include <vector>
 
 namespace fuzz {
@@ -50,6 +53,15 @@ template <size_t count>
 void run_one(void (*const (&functions)[count])(input *), const uint8_t *data, size_t size) {
     input in(data, size);
     functions[in.ConsumeIntegralInRange<size_t>(0, count - 1)](&in);
+}
+
+// A file of these bytes; its path. The one before is gone.
+inline std::string file_of(const std::vector<uint8_t> &bytes) {
+    static const int fd = memfd_create("input", MFD_CLOEXEC);
+    must(ftruncate(fd, 0) == 0, "a file is emptied");
+    must(pwrite(fd, bytes.data(), bytes.size(), 0) == static_cast<ssize_t>(bytes.size()),
+         "a file is written");
+    return "/proc/self/fd/" + std::to_string(fd);
 }
 
 }  // namespace fuzz

@@ -1,11 +1,8 @@
 // A whole job: any file, any mode, with all its threads. Bytes made up behind the input let a short
 // one be a song of minutes.
 #include <semaphore.h>
-#include <sys/mman.h>
-#include <unistd.h>
 
 #include <atomic>
-#include <string>
 
 #include "common/tavo_ctx.h"
 #include "fuzz/fuzz.h"
@@ -69,8 +66,6 @@ void analyse(TAVO_CTX *tavo, int32_t mode, fuzz::input *in) {
 }  // namespace
 
 int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    static const int fd = memfd_create("song", MFD_CLOEXEC);
-    static const std::string path = "/proc/self/fd/" + std::to_string(fd);
     constexpr size_t kChoices =
         6;  // bytes at the end, read twice: as choices, and as part of the file
     fuzz::input in(data + size - std::min(size, kChoices), std::min(size, kChoices));
@@ -79,10 +74,7 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     std::vector<uint8_t> song(data, data + size);
     const std::vector<uint8_t> pad = padding(1024 * pads);
     song.insert(song.end(), pad.begin(), pad.end());
-    must(ftruncate(fd, 0) == 0, "a file is there");
-    must(pwrite(fd, song.data(), song.size(), 0) == static_cast<ssize_t>(song.size()),
-         "a file is written");
-
+    const std::string path = fuzz::file_of(song);
     fnamedec = "";
     int32_t err = INT32_MIN;
     const TAVO_PARAM param = {path.c_str(), mode};

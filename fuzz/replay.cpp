@@ -1,4 +1,4 @@
-// replay DIR RUNS: gives a fuzzer's function every file in DIR, then RUNS inputs made of their
+// replay RUNS DIR...: gives a fuzzer's function every file in DIRs, then RUNS inputs made of their
 // pieces and of random bytes, the same ones each time. For compilers without libFuzzer, and for
 // every test run. The input of a failure is left in fuzz_last_input.
 #include <csignal>
@@ -57,12 +57,14 @@ void run(bytes input) {
 extern "C" void __sanitizer_set_death_callback(void (*callback)()) __attribute__((weak));
 
 int main(int argc, char **argv) {
-    if (argc != 3) return 2;
+    if (argc < 3) return 2;
     if (__sanitizer_set_death_callback != nullptr) __sanitizer_set_death_callback(keep_last);
     for (const int number : {SIGABRT, SIGSEGV}) signal(number, stop);
     std::vector<std::filesystem::path> paths;
-    for (const auto &entry : std::filesystem::directory_iterator(argv[1]))
-        paths.push_back(entry.path());
+    for (int i = 2; i < argc; ++i) {
+        for (const auto &entry : std::filesystem::directory_iterator(argv[i]))
+            paths.push_back(entry.path());
+    }
     std::sort(paths.begin(), paths.end());
     std::vector<bytes> kept;
     for (const auto &path : paths) {
@@ -71,7 +73,7 @@ int main(int argc, char **argv) {
         run(kept.back());
     }
     fuzz::must(!kept.empty(), "there are kept inputs");
-    for (long i = 0; i < atol(argv[2]); ++i) run(next_input(kept));
-    printf("%zu kept inputs, %s made ones\n", kept.size(), argv[2]);
+    for (long i = 0; i < atol(argv[1]); ++i) run(next_input(kept));
+    printf("%zu kept inputs, %s made ones\n", kept.size(), argv[1]);
     return 0;
 }

@@ -1,7 +1,7 @@
 // Any file as a media source: a stream is as long as it says, and any split of reads, from any
 // place, gives the same bytes.
 #include "common/tavo_ctx.h"
-#include "fuzz/memory_io.h"
+#include "fuzz/fuzz.h"
 #include "media_source/mtsrc_ctx.h"
 
 namespace {
@@ -104,16 +104,13 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     constexpr size_t kChoices =
         64;  // bytes at the end, read twice: as choices, and as part of the file
     fuzz::input in(data + size - std::min(size, kChoices), std::min(size, kChoices));
-    fuzz::file = {};
-    fuzz::file.bytes.assign(data, data + size);
-    const int32_t failing = in.ConsumeIntegralInRange(0, 255);
-    if (failing > 224) fuzz::file.fail_at = failing - 224;
-    const mtsrc_io io = fuzz::memory_io();
+    const std::string path = fuzz::file_of({data, data + size});
+    const mtsrc_param param = {path.c_str()};
     int32_t err = INT32_MIN;
     stream of;
-    of.src = mtsrc_open_mfal(&io, 0, &err);
+    of.src = mtsrc_init(&param, &err);
     if (of.src == nullptr) {
-        must(err <= -2 && (err >= -4 || err == -6 || err == -7 || err == -255),
+        must(err == -2 || err == -3 || err == -6 || err == -7 || err == -255,
              "an open fails as it may");
     } else {
         must(err == 0 && mtsrc_getstream_format(of.src, &of.format) == 0,
@@ -125,6 +122,5 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
         for (int i = in.ConsumeIntegralInRange(1, 5); i > 0; --i) operate(&of, &in);
         must(mtsrc_deinit(of.src) == -5, "a release is done");
     }
-    must(fuzz::file.open == 0, "every file that was opened is closed");
     return 0;
 }

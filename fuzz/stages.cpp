@@ -6,14 +6,9 @@
 #include <memory>
 
 #include "beat/beat_ctx.h"
-#include "beat/beats.h"
 #include "beat/candidates.h"
-#include "beat/click_track.h"
-#include "beat/power_rise.h"
 #include "beat/tempo.h"
 #include "fuzz/fuzz.h"
-#include "highlight/position.h"
-#include "highlight/power_envelope.h"
 #include "highlight/region.h"
 #include "highlight/search.h"
 #include "pcm/resample.h"
@@ -31,7 +26,6 @@ namespace {
 using fuzz::must;
 
 constexpr size_t kMostPoints = 400;
-constexpr int64_t kMostSamples = 45'000;
 
 std::vector<int16_t> take_pcm(fuzz::input *in, size_t most) {
     std::vector<int16_t> pcm(std::min(in->remaining_bytes() / 2, most));
@@ -93,21 +87,6 @@ void convert(fuzz::input *in) {
 }
 
 // --- 7: the highlight
-
-void measure_power(fuzz::input *in) {
-    const int64_t hop = in->ConsumeIntegralInRange(1, 60);
-    const std::vector<int16_t> pcm = take_pcm(in, 3000);
-    const int64_t count = static_cast<int64_t>(pcm.size()) / hop - 2;
-    std::vector<float> out(static_cast<size_t>(std::max<int64_t>(count, 0)));
-    overlapping_powers(pcm.data(), hop, count, out.data());
-    for (size_t k = 0; k < out.size(); ++k) {
-        const int16_t *window = pcm.data() + static_cast<int64_t>(k) * hop;
-        const float wanted = reference::power(window, 3 * hop);
-        must(window_power(window, 3 * hop) == wanted, "a window has its power");
-        must(std::fabs(out[k] - wanted) <= 1e-6f * std::fmax(wanted, 1.0f),
-             "so have windows that overlap");
-    }
-}
 
 void find_valleys(fuzz::input *in) {
     const auto mean = in->ConsumeProbability<float>();
@@ -173,31 +152,6 @@ void search_curve(fuzz::input *in) {
     must(!plain || _get_HL_simple(&hl, duration) == start, "a start does not depend on the volume");
 }
 
-// Each byte is the loudness of a part of a song.
-void whole_highlight(fuzz::input *in) {
-    TAVO_CTX ctx = {};
-    ctx.fmt.sample_rate =
-        5 * in->ConsumeIntegralInRange(1, 8);  // frames of 0.4 s have whole samples
-    const int32_t wanted = in->ConsumeIntegral<int8_t>();
-    const int32_t lied =
-        in->ConsumeIntegralInRange(-2, 2);  // seconds by which the duration is wrong
-    const auto part = in->ConsumeIntegralInRange<size_t>(1, 90);
-    std::vector<int16_t> pcm;
-    for (const int8_t level : in->ConsumeBytes<int8_t>(200))
-        pcm.insert(pcm.end(), part, static_cast<int16_t>(level * 256));
-    const auto samples = static_cast<int64_t>(pcm.size());
-    ctx.pcm = pcm.data();
-    ctx.pcm_bytes = 2 * samples;
-    ctx.duration = (samples / ctx.fmt.sample_rate + lied) * kUnitsPerSecond;
-    ctx.hl = static_cast<TAVO_HL_CTX *>(calloc(1, sizeof(TAVO_HL_CTX)));
-    ctx.hl->hl_param = wanted;
-    const uint32_t start = getHLPosition(&ctx);
-    must(start == ctx.hl->hl_pos, "the start is stored");
-    must(start * static_cast<int64_t>(ctx.fmt.sample_rate) <= samples * 1000 + 1000,
-         "a highlight starts in the song");
-    clearHighlgihtCtx(ctx.hl);
-}
-
 // --- 4 to 6: beats
 
 struct analysis {
@@ -214,32 +168,6 @@ struct analysis {
         fnamedec = "";
     }
 };
-
-// Loudness values, stretched to a signal of full scale 1; the kind of sound changes with them.
-std::vector<double> take_signal(fuzz::input *in) {
-    const auto stretch = in->ConsumeIntegralInRange<size_t>(1, 6000);
-    std::vector<double> signal;
-    uint32_t noise = 1;
-    for (const uint8_t level : in->ConsumeBytes<uint8_t>(kMostSamples / stretch)) {
-        for (size_t i = 0; i < stretch; ++i) {
-            noise = noise * 1664525u + 1013904223u;
-            const double wave = level % 2 == 0              ? noise / 2147483648.0 - 1.0
-                                : i % (2 + level % 32) == 0 ? 1.0
-                                                            : -1.0;
-            signal.push_back(wave * level / 255.0);
-        }
-    }
-    return signal;
-}
-
-void find_rises(fuzz::input *in) {
-    const std::vector<double> signal = take_signal(in);
-    std::vector<int32_t> flags(signal.size());
-    const int32_t count =
-        detectPowerVariation(signal.data(), flags.data(), static_cast<int64_t>(signal.size()));
-    must(count == std::count(flags.begin(), flags.end(), 1), "each rise has its flag");
-    must(flags == reference::rises(signal), "rises are where every sample's level puts them");
-}
 
 void fill_gap(fuzz::input *in) {
     const auto heights = fuzz::values<double>(in, 60);
@@ -259,14 +187,6 @@ void fill_gap(fuzz::input *in) {
                       static_cast<int32_t>(most), heights.data());
     out.resize(static_cast<size_t>(found));
     must(out == wanted, "the strongest peaks come back");
-}
-
-void check_beats(const float *beats, int32_t count, int64_t frames) {
-    const auto last = static_cast<float>(frames + 1) * (1000.0f * kHopSize / kAnalysisRate);
-    for (int32_t k = 0; k < count; ++k) {
-        must(beats[k] > 0.0f && beats[k] <= last, "a beat lies in the song");
-        must(k == 0 || beats[k - 1] <= beats[k], "beats ascend");
-    }
 }
 
 // From an envelope on: tempo, threshold, candidates, gaps. Values repeat.
@@ -302,7 +222,10 @@ void place_beats(fuzz::input *in) {
     std::vector<float> out(static_cast<size_t>(candidate_room(beat)));
     const int32_t count = getBeatCandi_MT(beat, &run.onset, out.data());
     must(count >= 0 && (limit < 1 || count <= limit + kMaxAddedBeats), "beats are limited");
-    check_beats(out.data(), count, beat->frame_count);
+    must(std::is_sorted(out.begin(), out.begin() + count), "beats ascend");
+    const float last = 1000.0f * beat->frame_times[0] * static_cast<float>(frames + 1);
+    must(count == 0 || (out[0] > 0.0f && out[static_cast<size_t>(count) - 1] <= last),
+         "beats lie in the song");
     const double four_beats = std::trunc(4.0 * 60.0 / run.onset.bpm);
     const auto window = static_cast<int64_t>(static_cast<float>(four_beats) / beat->frame_times[0]);
     const auto curve = reference::threshold(env, window + window % 2);
@@ -311,33 +234,11 @@ void place_beats(fuzz::input *in) {
     __tavo_deinit(beat);
 }
 
-void whole_beats(fuzz::input *in) {
-    const int32_t limit = in->ConsumeIntegral<int8_t>();
-    std::vector<double> signal = take_signal(in);
-    for (double &sample : signal) sample *= 32767.0;
-    analysis run(&signal);
-    run.onset.max_beats = limit;
-    const int32_t count = getBeatPosition(&run.ctx);
-    must(count == run.onset.beat_count && run.ctx.state == kStateFinished, "it runs to its end");
-    must(run.onset.bpm >= 30 && run.onset.bpm <= 200, "a tempo is 30 to 200");
-    check_beats(run.onset.beat_times, count, run.ctx.ana_len / kHopSize);
-    free(run.onset.beat_times);
-}
-
-// Whatever beats there are, blips stay in the track.
-void lay_blips(fuzz::input *in) {
-    const int32_t rate = in->ConsumeIntegralInRange(1, 192'000);
-    std::vector<float> track(in->ConsumeIntegralInRange<size_t>(0, 30'000));
-    const auto beats = fuzz::values<float>(in, 64);
-    makeBlipTrack(beats.data(), static_cast<int32_t>(beats.size()), rate,
-                  static_cast<int64_t>(track.size()), track.data());
-}
-
 }  // namespace
 
 int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    fuzz::run_one({interpolate, convert, measure_power, find_valleys, select_region, search_curve,
-                   whole_highlight, find_rises, fill_gap, place_beats, whole_beats, lay_blips},
-                  data, size);
+    fuzz::run_one(
+        {interpolate, convert, find_valleys, select_region, search_curve, fill_gap, place_beats},
+        data, size);
     return 0;
 }
