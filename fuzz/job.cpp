@@ -48,7 +48,7 @@ void analyse(TAVO_CTX *tavo, int32_t mode, fuzz::input *in) {
     tavo_setcallback(tavo, on_result);
     must(tavo_analyze(tavo, length, max_beats, 0) == TAVO_OK, "a job starts");
     if (!stop) {
-        sem_wait(&called);
+        while (sem_wait(&called) != 0) continue;  // interrupted
         const bool complete = last.status == 0;
         must(complete || (last.status == -1 && mode != TAVO_MODE_HIGHLIGHT),
              "a result or a failure");

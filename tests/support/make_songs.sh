@@ -59,7 +59,6 @@ flac --totally-silent -5 -o song.flac song.wav
 flac --totally-silent -5 --no-seektable -T 'TITLE=A Title' -T 'ARTIST=An Artist' -T 'KEY=Am' \
   -o no_table.flac song.wav
 flac --totally-silent -5 --no-seektable -b 1152 -o short_blocks.flac song.wav
-flac --totally-silent -5 --no-seektable -b 4096 -o long_blocks.flac song.wav
 flac --totally-silent --lax -0 -b 65535 --no-seektable -o huge_blocks.flac song.wav
 flac --totally-silent -5 -o mono.flac mono.wav
 flac --totally-silent -5 --channel-map=none -o six.flac six.wav
