@@ -167,7 +167,7 @@ TEST(Beats, NothingHasNinetyAndNoBeats) {
         ASSERT_EQ(file.size(), 44 + 2 * n);
         std::vector<int16_t> expected(n, n < 768 ? 500 : 0);
         if (n > 1 && n < 768) expected[1] = -500;
-        EXPECT_EQ(memcmp(file.data() + 44, expected.data(), 2 * n), 0) << n;
+        EXPECT_TRUE(n == 0 || memcmp(file.data() + 44, expected.data(), 2 * n) == 0) << n;
     }
     EXPECT_EQ(getBeatPosition(nullptr), 0);
     clearOnsetCtx(nullptr);

@@ -52,6 +52,18 @@ TEST(Candidates, PeaksAndTheirDistance) {
     EXPECT_EQ(env.place(1), frames{200});
 }
 
+// 96 BPM: two periods, 1.25 s. From 95 BPM down at least 3 s: five periods, 3.158 s.
+TEST(Candidates, SlowBeatsLieFartherApart) {
+    for (const auto &c : {std::pair{96, 53}, {95, 135}}) {
+        for (const int near : {0, 1}) {
+            envelope env(1000, c.first);
+            env.peak(300, 5.0);
+            env.peak(300 + c.second - near, 6.0);
+            EXPECT_EQ(env.place().size(), near == 0 ? 2u : 1u) << c.first << " BPM";
+        }
+    }
+}
+
 TEST(Candidates, ARiseNeedsNoThreshold) {
     envelope env(1000, 120);
     env.peak(100, 20.0);
@@ -62,14 +74,16 @@ TEST(Candidates, ARiseNeedsNoThreshold) {
     env.rises({290, 310});
     // Both rises take the peak at 300, so the beat appears twice, and 330 lies too close to it.
     EXPECT_EQ(env.place(), (frames{100, 300, 300, 400}));
+}
 
-    // The last peak serves no rise; an ordinary one then takes the place that needs no threshold.
-    envelope last(400, 120);
-    last.kept_out(200, 9.0);
-    last.peak(300, 5.0);
-    EXPECT_EQ(last.place(), frames{300});
-    last.rises({350});
-    EXPECT_EQ(last.place(), (frames{200, 300}));
+// The last peak serves no rise; an ordinary one then takes the place that needs no threshold.
+TEST(Candidates, ARiseThatFindsNoPeak) {
+    envelope env(400, 120);
+    env.kept_out(200, 9.0);
+    env.peak(300, 5.0);
+    EXPECT_EQ(env.place(), frames{300});
+    env.rises({350});
+    EXPECT_EQ(env.place(), (frames{200, 300}));
 }
 
 TEST(Candidates, GapsAreFilled) {

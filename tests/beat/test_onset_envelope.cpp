@@ -184,20 +184,25 @@ TEST(OnsetEnvelope, HasTheBitsOfItsFramesOneByOne) {
     }
 }
 
+// Three bands that are none, with zeros between the weights and some below 0, and no window: a tone
+// of a whole number of periods then leaves rounding errors alone in all other bins.
 TEST(FramePair, HasTheBitsOfEachFrameAlone) {
     std::mt19937 random(5);
     for (const size_t bands : {size_t{36}, size_t{3}}) {
         transform of(bands);
-        for (float &w :
-             of.weights) {  // no bands at all: zeros between the weights, and some below 0
+        if (bands == 3) of.window.assign(512, 1.0);
+        for (float &w : of.weights) {
             if (bands == 3) w = random() % 4 == 0 ? 0.0f : static_cast<float>(uniform(&random));
         }
         pair_tables *tables = of.tables();
         ASSERT_NE(tables, nullptr);
         for (int round = 0; round < 2000; ++round) {
-            const std::vector<double> samples = wild_samples(900, 50, &random);
+            std::vector<double> samples = wild_samples(900, 50, &random);
+            for (size_t i = 0; i < samples.size() && round % 2 == 0; ++i) {
+                samples[i] = cos(6.283185307179586 / 512 * static_cast<double>(i) * (round % 100));
+            }
             const double *at = samples.data();
-            const size_t hop = round % 2 == 0 ? 256 : random() % 389;
+            const size_t hop = round % 4 < 2 ? 256 : random() % 389;
             std::vector<double> first(bands), second(bands);
             ASSERT_TRUE(take_pair(tables, at, at + hop, first.data(), second.data()));
             ASSERT_TRUE(same_bits(first, of.plain_bands(at))) << round;

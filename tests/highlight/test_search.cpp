@@ -76,7 +76,7 @@ TEST(Valleys, EndsOfTheQuietStretches) {
 // Mean above 0.5: below 0.75 - 1.5 x 0.25 = 0.375. Mean 0.5 exactly is not above: below 0.375 as
 // well, not 0.3125.
 TEST(Valleys, LoudSongsNeedDeeperDips) {
-    const float values[] = {1.0f, 0.5f, 1.0f, 1.0f, 1.0f, 0.25f, 1.0f, 0.34375f, 1.0f};
+    const float values[] = {1.0f, 0.4375f, 1.0f, 1.0f, 1.0f, 0.25f, 1.0f, 0.34375f, 1.0f};
     int32_t out[15];
     ASSERT_EQ(tavo_find_valley(values, 7, out, 0.75f, 0.25f, 2.0f), 1);
     EXPECT_EQ(out[0], 5);
