@@ -84,10 +84,10 @@ outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
 
 outcome analyse(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     outcome end = stop_asked(ctx);
-    if (end == going_on) end = take_onsets_and_rises(ctx, beat);
-    if (end == going_on) end = find_tempo(ctx->onset, beat);
+    if (end == going_on) end = take_onsets_and_rises(ctx, beat);  // stage 4
+    if (end == going_on) end = find_tempo(ctx->onset, beat);      // stage 5
     if (end == going_on) end = stop_asked(ctx);
-    if (end == going_on) end = find_beats(ctx->onset, beat);
+    if (end == going_on) end = find_beats(ctx->onset, beat);  // stage 6
     if (end == going_on) write_click_track(ctx);
     return end;
 }

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "beat/beat_ctx.h"
+#include "beat/beats.h"
 #include "beat/candidates.h"
 #include "beat/click_track.h"
 #include "beat/onset_envelope.h"
@@ -115,6 +116,14 @@ void close_analysis(analysis *a) {
     a->beat = TAVO_BEAT_CTX{};
 }
 
+void beats(benchmark::State &state) {
+    analysis a;
+    open_analysis(&a);
+    close_analysis(&a);
+    for (auto _ : state) benchmark::DoNotOptimize(getBeatPosition(&a.ctx));
+    free(a.onset.beat_times);
+}
+
 void set_up(benchmark::State &state) {
     analysis a;
     open_analysis(&a);
@@ -189,12 +198,13 @@ int main(int argc, char **argv) {
     fnamedec = "";
     add("mode 1: open and decode WAV", open_and_decode);
     add("mode 1: convert, block average from", convert, 44100);
-    add("mode 1: set up the beat context", set_up);
-    add("mode 1: power rises", power_rises);
-    add("mode 1: onset envelope", onset_envelope);
-    add("mode 1: tempo", tempo);
-    add("mode 1: placement", placement);
-    add("mode 1: click track, no file", click_track);
+    add("mode 1: beat analysis", beats);
+    add("beats: set up with a scaled signal", set_up);
+    add("beats: power rises", power_rises);
+    add("beats: onset envelope", onset_envelope);
+    add("beats: tempo", tempo);
+    add("beats: placement", placement);
+    add("beats: blips of a click track", click_track);
     add("convert, windowed sinc from", convert, 48000);
     add("mode 0: highlight", highlight);
     benchmark::Initialize(&argc, argv);
