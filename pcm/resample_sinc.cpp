@@ -19,6 +19,8 @@ constexpr double kFracLimit = 0.500001;       // half a sample and some rounding
 constexpr float kRatioLimit = 2147483648.0f;  // no pair of rates reaches it
 
 constexpr int32_t kLanes = 4;
+constexpr float kExactSum = 4194304.0f;       // 2^22: smaller sums have exact fractions
+constexpr float kPlaceLimit = 1073741824.0f;  // 2^30: smaller places and their sums fit 32 bits
 using vec_f32 = float __attribute__((vector_size(16)));
 using vec_i16 = int16_t __attribute__((vector_size(16)));
 using vec_i32 = int32_t __attribute__((vector_size(16)));
@@ -77,9 +79,9 @@ int16_t wrap_sample(float acc) {
     return static_cast<int16_t>(static_cast<uint16_t>(rounded));
 }
 
-// Any frame. Places outside the input count as 0.
-void filter_edge(const dorn_resampler_state &state, const frame_place &place, const int16_t *in,
-                 int32_t in_len, int16_t *out) {
+// One frame, wherever it lies. Places outside the input count as 0.
+void filter_frame(const dorn_resampler_state &state, const frame_place &place, const int16_t *in,
+                  int32_t in_len, int16_t *out) {
     for (int32_t c = 0; c < state.channels; ++c) {
         float acc = 0.0f;
         for (int32_t k = 0; k <= state.taps; ++k) {
@@ -103,20 +105,36 @@ vec_f32 weigh_taps(const float *row, const int16_t *in) {
     return weights * __builtin_convertvector(samples, vec_f32);
 }
 
-// kLanes mono frames wholly inside the input, side by side. Each lane of the sum takes the taps of
-// its frame in their order, so it has the bits of filter_edge.
-void filter_inside(int32_t taps, const frame_place *place, const int16_t *in, int16_t *out) {
-    const int16_t *const in0 = in + place[0].first;
-    const int16_t *const in1 = in + place[1].first;
-    const int16_t *const in2 = in + place[2].first;
-    const int16_t *const in3 = in + place[3].first;
+// Whether a lane of the comparison's result is set.
+bool any_lane(vec_i32 mask) {
+    const auto halves = reinterpret_cast<vec_i64>(mask);
+    return (halves[0] | halves[1]) != 0;
+}
+
+// wrap_sample of four sums. False, with nothing written, when one of them is too large.
+bool wrap_four(vec_f32 acc, int16_t *out) {
+    if (any_lane(~((acc > -kExactSum) & (acc < kExactSum)))) return false;
+    vec_i32 rounded = __builtin_convertvector(acc, vec_i32);
+    const vec_f32 rest = acc - __builtin_convertvector(rounded, vec_f32);
+    rounded += (rest < -0.5f) - (rest >= 0.5f);  // a comparison that holds is -1
+    const auto halves = reinterpret_cast<vec_i16>(rounded);
+    const auto low =
+        reinterpret_cast<vec_i64>(__builtin_shufflevector(halves, halves, 0, 2, 4, 6, 0, 2, 4, 6));
+    const int64_t four = low[0];
+    memcpy(out, &four, sizeof four);
+    return true;
+}
+
+// The sums of four mono frames wholly inside the input, side by side. Each lane takes the taps of
+// its frame in their order, so it has the bits of filter_frame.
+vec_f32 sum_four(int32_t taps, const float *const *row, const int16_t *const *in) {
     vec_f32 acc = {};
     int32_t k = 0;
     for (; k + kLanes <= taps + 1; k += kLanes) {
-        const vec_f32 a = weigh_taps(place[0].row + k, in0 + k);
-        const vec_f32 b = weigh_taps(place[1].row + k, in1 + k);
-        const vec_f32 c = weigh_taps(place[2].row + k, in2 + k);
-        const vec_f32 d = weigh_taps(place[3].row + k, in3 + k);
+        const vec_f32 a = weigh_taps(row[0] + k, in[0] + k);
+        const vec_f32 b = weigh_taps(row[1] + k, in[1] + k);
+        const vec_f32 c = weigh_taps(row[2] + k, in[2] + k);
+        const vec_f32 d = weigh_taps(row[3] + k, in[3] + k);
         // From four taps of a frame in a vector to four frames of a tap in a vector.
         const vec_f32 ab_low = __builtin_shufflevector(a, b, 0, 4, 1, 5);
         const vec_f32 ab_high = __builtin_shufflevector(a, b, 2, 6, 3, 7);
@@ -128,12 +146,56 @@ void filter_inside(int32_t taps, const frame_place *place, const int16_t *in, in
         acc += __builtin_shufflevector(ab_high, cd_high, 2, 3, 6, 7);
     }
     for (; k <= taps; ++k) {
-        const vec_i32 samples = {in0[k], in1[k], in2[k], in3[k]};
-        const vec_f32 weights = {place[0].row[k], place[1].row[k], place[2].row[k],
-                                 place[3].row[k]};
+        const vec_i32 samples = {in[0][k], in[1][k], in[2][k], in[3][k]};
+        const vec_f32 weights = {row[0][k], row[1][k], row[2][k], row[3][k]};
         acc += weights * __builtin_convertvector(samples, vec_f32);
     }
-    for (int32_t lane = 0; lane < kLanes; ++lane) out[lane] = wrap_sample(acc[lane]);
+    return acc;
+}
+
+// What four frames from j on read: places and phases as place_frame finds them, in fewer steps.
+// False when a frame is not wholly inside the input or its phase may be out of range.
+bool place_four(const dorn_resampler_state &state, int64_t j, int32_t in_len, vec_i32 *first,
+                vec_i32 *phase) {
+    const float last = state.ratio * static_cast<float>(j + kLanes - 1);
+    if (j > INT32_MAX - kLanes || last >= kPlaceLimit) return false;
+    const auto lane0 = static_cast<int32_t>(j);
+    const vec_i32 frame = {lane0, lane0 + 1, lane0 + 2, lane0 + 3};
+    const vec_f32 pos = state.ratio * __builtin_convertvector(frame, vec_f32);
+    const vec_i32 base = __builtin_convertvector(pos, vec_i32);
+    const vec_f32 whole = __builtin_convertvector(base, vec_f32);
+
+    // Places ascend: the first and the last speak for all.
+    const float half = static_cast<float>(state.taps) / 2.0f;
+    *first = base - static_cast<int32_t>(half);
+    if (base[0] < 1 || (*first)[0] < 0 || (*first)[3] + state.taps >= in_len) return false;
+    if (static_cast<double>(half + whole[3]) >= static_cast<double>(in_len)) return false;
+
+    // Places of 1 and more have at most 23 fractional bits, so the differences are exact, and
+    // floor(960 * frac + 480.5) is too when it is worked out in units of 2^-17.
+    const vec_f32 frac = pos - whole - (state.taps % 2 != 0 ? 0.5f : 0.0f);
+    if (any_lane(frac > 0.5f)) return false;
+    const vec_i32 bits = __builtin_convertvector(frac * 8388608.0f, vec_i32);
+    *phase = (bits * 15 + (961 << 16)) >> 17;
+    return true;
+}
+
+// Four mono frames from j on, with the bits of filter_frame. False, with nothing written, when
+// place_four cannot place them.
+bool filter_four(const dorn_resampler_state &state, int64_t j, const int16_t *in, int32_t in_len,
+                 int16_t *out) {
+    vec_i32 first;
+    vec_i32 phase;
+    if (!place_four(state, j, in_len, &first, &phase)) return false;
+    const float *const row[kLanes] = {state.coef[phase[0]], state.coef[phase[1]],
+                                      state.coef[phase[2]], state.coef[phase[3]]};
+    const int16_t *const from[kLanes] = {in + first[0], in + first[1], in + first[2],
+                                         in + first[3]};
+    const vec_f32 acc = sum_four(state.taps, row, from);
+    if (!wrap_four(acc, out)) {
+        for (int32_t lane = 0; lane < kLanes; ++lane) out[lane] = wrap_sample(acc[lane]);
+    }
+    return true;
 }
 
 bool usable(const dorn_resampler_state &state) {
@@ -151,23 +213,17 @@ int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int
     placed status = placed::inside;
     int64_t j = 0;
     while (j < max_frames && status == placed::inside) {
-        frame_place place[kLanes];
-        int32_t lanes = 0;
-        while (lanes < kLanes && j + lanes < max_frames) {
-            status = place_frame(*state, j + lanes, in_len, &place[lanes]);
-            if (status != placed::inside) break;
-            ++lanes;
+        // Near the ends and with several channels, frame by frame.
+        if (channels == 1 && j + kLanes <= max_frames &&
+            filter_four(*state, j, in, in_len, out + j)) {
+            j += kLanes;
+            continue;
         }
-        // Places ascend: the first and the last speak for all.
-        if (channels == 1 && lanes == kLanes && place[0].first >= 0 &&
-            place[kLanes - 1].first + state->taps < in_len) {
-            filter_inside(state->taps, place, in, out + j);
-        } else {
-            for (int32_t lane = 0; lane < lanes; ++lane) {
-                filter_edge(*state, place[lane], in, in_len, out + (j + lane) * channels);
-            }
-        }
-        j += lanes;
+        frame_place place;
+        status = place_frame(*state, j, in_len, &place);
+        if (status != placed::inside) break;
+        filter_frame(*state, place, in, in_len, out + j * channels);
+        ++j;
     }
     return status == placed::bad_phase ? -1 : j * channels;
 }

@@ -190,6 +190,10 @@ TEST(resample_sinc, arithmetic_by_hand) {
     const auto order = three_taps(16'777'216.0f, 1.0f, -16'777'216.0f);
     EXPECT_EQ(dorn_resampler_convert(order.get(), ones.data(), 20, out.data()), 19);
     EXPECT_EQ(sample_run(out.begin() + 1, out.begin() + 18), sample_run(17, 0));
+    // 5,000,000 is 76 * 65,536 + 19,264.
+    const sample_run loud(20, 5000);
+    dorn_resampler_convert(three_taps(0, 1000.0f, 0).get(), loud.data(), 20, out.data());
+    EXPECT_EQ(sample_run(out.begin(), out.begin() + 19), sample_run(19, 19'264));
 }
 
 TEST(resample_sinc, bad_arguments_and_phases) {
