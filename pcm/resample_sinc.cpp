@@ -19,8 +19,7 @@ constexpr double kFracLimit = 0.500001;       // half a sample and some rounding
 constexpr float kRatioLimit = 2147483648.0f;  // no pair of rates reaches it
 
 constexpr int32_t kLanes = 4;
-constexpr float kExactSum = 4194304.0f;       // 2^22: smaller sums have exact fractions
-constexpr float kPlaceLimit = 1073741824.0f;  // 2^30: smaller places and their sums fit 32 bits
+constexpr float kSmallFloat = 1073741824.0f;  // 2^30: a little more still fits an int32_t
 using vec_f32 = float __attribute__((vector_size(16)));
 using vec_i16 = int16_t __attribute__((vector_size(16)));
 using vec_i32 = int32_t __attribute__((vector_size(16)));
@@ -113,7 +112,7 @@ bool any_lane(vec_i32 mask) {
 
 // wrap_sample of four sums. False, with nothing written, when one of them is too large.
 bool wrap_four(vec_f32 acc, int16_t *out) {
-    if (any_lane(~((acc > -kExactSum) & (acc < kExactSum)))) return false;
+    if (any_lane(~((acc > -kSmallFloat) & (acc < kSmallFloat)))) return false;
     vec_i32 rounded = __builtin_convertvector(acc, vec_i32);
     const vec_f32 rest = acc - __builtin_convertvector(rounded, vec_f32);
     rounded += (rest < -0.5f) - (rest >= 0.5f);  // a comparison that holds is -1
@@ -158,7 +157,7 @@ vec_f32 sum_four(int32_t taps, const float *const *row, const int16_t *const *in
 bool place_four(const dorn_resampler_state &state, int64_t j, int32_t in_len, vec_i32 *first,
                 vec_i32 *phase) {
     const float last = state.ratio * static_cast<float>(j + kLanes - 1);
-    if (j > INT32_MAX - kLanes || last >= kPlaceLimit) return false;
+    if (j > INT32_MAX - kLanes || last >= kSmallFloat) return false;
     const auto lane0 = static_cast<int32_t>(j);
     const vec_i32 frame = {lane0, lane0 + 1, lane0 + 2, lane0 + 3};
     const vec_f32 pos = state.ratio * __builtin_convertvector(frame, vec_f32);
@@ -168,7 +167,7 @@ bool place_four(const dorn_resampler_state &state, int64_t j, int32_t in_len, ve
     // Places ascend: the first and the last speak for all.
     const float half = static_cast<float>(state.taps) / 2.0f;
     *first = base - static_cast<int32_t>(half);
-    if (base[0] < 1 || (*first)[0] < 0 || (*first)[3] + state.taps >= in_len) return false;
+    if ((*first)[0] < 1 || (*first)[3] + state.taps >= in_len) return false;
     if (static_cast<double>(half + whole[3]) >= static_cast<double>(in_len)) return false;
 
     // Places of 1 and more have at most 23 fractional bits, so the differences are exact, and

@@ -1,5 +1,6 @@
 #include <cmath>
 #include <memory>
+#include <numeric>
 
 #include "pcm/resample.h"
 #include "pcm/song.h"
@@ -190,10 +191,12 @@ TEST(resample_sinc, arithmetic_by_hand) {
     const auto order = three_taps(16'777'216.0f, 1.0f, -16'777'216.0f);
     EXPECT_EQ(dorn_resampler_convert(order.get(), ones.data(), 20, out.data()), 19);
     EXPECT_EQ(sample_run(out.begin() + 1, out.begin() + 18), sample_run(17, 0));
-    // 5,000,000 is 76 * 65,536 + 19,264.
+    // 5,000,000 is 76 * 65,536 + 19,264, and a thousand times as much 76,294 * 65,536 - 3584.
     const sample_run loud(20, 5000);
     dorn_resampler_convert(three_taps(0, 1000.0f, 0).get(), loud.data(), 20, out.data());
     EXPECT_EQ(sample_run(out.begin(), out.begin() + 19), sample_run(19, 19'264));
+    dorn_resampler_convert(three_taps(0, 1e6f, 0).get(), loud.data(), 20, out.data());
+    EXPECT_EQ(sample_run(out.begin(), out.begin() + 19), sample_run(19, -3584));
 }
 
 TEST(resample_sinc, bad_arguments_and_phases) {
@@ -206,19 +209,33 @@ TEST(resample_sinc, bad_arguments_and_phases) {
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), -1, out.data()), 0);
     EXPECT_EQ(dorn_resampler_convert(prepared(-48000).get(), in.data(), 100, out.data()), -1);
     // An even span and a ratio that is not whole: the offset is 0 or 1/2, still the last phase;
-    // with a ratio of 1.25 it is 3/4 at j = 3.
+    // with a ratio of 1.125 it is 5/8 at j = 5.
     auto drifting = three_taps(0, 1, 0);
     drifting->coef[960][1] = 5.0f;
     drifting->ratio = 1.5f;
     EXPECT_EQ(dorn_resampler_convert(drifting.get(), in.data(), 100, out.data()), 66);
     EXPECT_EQ(out[1], 5);
-    drifting->ratio = 1.25f;
+    drifting->ratio = 1.125f;
+    std::fill(out.begin(), out.end(), 77);
     EXPECT_EQ(dorn_resampler_convert(drifting.get(), in.data(), 100, out.data()), -1);
+    EXPECT_EQ(sample_run(out.begin() + 2, out.begin() + 6), (sample_run{0, 0, 5, 77}));
+    // The end is tested in single precision: 2^27 + 10 counts as 2^27 + 16, beyond the input.
+    constexpr int32_t kLong = (1 << 27) + 12;
+    auto *silence = static_cast<int16_t *>(calloc(kLong, sizeof(int16_t)));
+    drifting->taps = 20;
+    drifting->ratio = 33'554'432.0f;  // a quarter of 2^27
+    EXPECT_EQ(dorn_resampler_convert(drifting.get(), silence, kLong, out.data()), 4);
+    free(silence);
 }
 
 TEST(resample_sinc, four_side_by_side_have_the_bits_of_one) {
+    std::vector<int32_t> lengths(120);
+    std::iota(lengths.begin(), lengths.end(), 9);
+    lengths.push_back(20'000);
     for (const int32_t rate : {8000, 48000, 88200, 88201, 192'000}) {
-        for (const int32_t len : {9, 10, 11, 20, 21, 57, 1001, 20'000}) {
+        const auto mono = prepared(rate);
+        const auto stereo = prepared(rate, 2);
+        for (const int32_t len : lengths) {
             SCOPED_TRACE(testing::Message() << rate << ' ' << len);
             const sample_run in = samples_of(noise(2 * len, uint32_t(len) + 7));
             // Two channels are filtered frame by frame.
@@ -226,12 +243,12 @@ TEST(resample_sinc, four_side_by_side_have_the_bits_of_one) {
             for (const int16_t sample : in) twice.insert(twice.end(), {sample, sample});
             sample_run want(in.size() * 4, 77);
             const int32_t code =
-                dorn_resampler_convert(prepared(rate, 2).get(), twice.data(), 2 * len, want.data());
+                dorn_resampler_convert(stereo.get(), twice.data(), 2 * len, want.data());
             // Loud surroundings, which must not be heard.
             sample_run loud(in.size() + 200, 32'767);
             std::copy(in.begin(), in.end(), loud.begin() + 100);
             sample_run out(in.size() * 2, 77);
-            EXPECT_EQ(dorn_resampler_convert(prepared(rate).get(), &loud[100], len, out.data()),
+            EXPECT_EQ(dorn_resampler_convert(mono.get(), &loud[100], len, out.data()),
                       code < 0 ? code : code / 2);
             for (size_t i = 0; i < out.size(); ++i) ASSERT_EQ(out[i], want[2 * i]) << i;
         }
