@@ -10,6 +10,7 @@
 #include "cli/click.h"
 #include "cli/explain.h"
 #include "cli/library_path.h"
+#include "cli/markers.h"
 #include "cli/words.h"
 #include "core/tavo.h"
 
@@ -124,7 +125,12 @@ record analyse(const std::string &path, const options &opts, int stop_fd) {
     analyse_opened(opened, opts, stop_fd, out);
     out.cpu_ms = cpu_time_ms() - before_ms;
     close_library_path(opened);
-    const std::string error = finish_click(click, out.status == outcome::ok);
+    std::string cue;
+    if (opts.format == result_format::cue) {
+        cue = cue_chunks(out);
+        out.written = opts.click;
+    }
+    const std::string error = finish_click(click, out.status == outcome::ok, cue);
     if (!error.empty()) {
         out.status = outcome::failed;
         out.error = error;

@@ -20,7 +20,8 @@ struct click_file {
 std::string begin_click(click_file &click, const std::string &target, const std::string &input,
                         bool force);
 
-// After the job: puts a complete track in place, removes an incomplete one. Returns as above.
-std::string finish_click(click_file &click, bool analysed);
+// After the job: puts a complete track in place, with the RIFF chunks behind its sound, and removes
+// an incomplete one. Returns as above.
+std::string finish_click(click_file &click, bool analysed, const std::string &chunks);
 
 #endif

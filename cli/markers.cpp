@@ -14,7 +14,13 @@ struct marker_format {
     std::string (*content)(const record &result, const options &opts);
 };
 constexpr marker_format kMarkerFormats[] = {
-    {result_format::labels, ".labels.txt", label_track},
+    {result_format::labels, ".labels.txt", audacity_labels},
+    {result_format::kdenlive, ".guides.txt", kdenlive_guides},
+    {result_format::losslesscut, ".losslesscut.csv", losslesscut_segments},
+    {result_format::ffmetadata, ".ffmetadata.txt", ffmetadata_chapters},
+    {result_format::edl, ".edl", edl_markers},
+    {result_format::fcpxml, ".fcpxml", fcpxml_markers},
+    {result_format::reaper, ".reaper.csv", reaper_markers},
 };
 constexpr int32_t kUsualLengthSeconds = 30;  // marked without --length: a preview's
 
@@ -43,6 +49,16 @@ std::string marker_content(const record &result, const options &opts) {
     return find_format(opts.format)->content(result, opts);
 }
 
-double region_end_ms(const record &result) {
-    return highlight_end_ms(result, result.length_s > 0 ? result.length_s : kUsualLengthSeconds);
+std::vector<mark> marks_of(const record &result) {
+    std::vector<mark> marks;
+    if (result.has_highlight) {
+        const int32_t seconds = result.length_s > 0 ? result.length_s : kUsualLengthSeconds;
+        marks.push_back({static_cast<double>(result.hl_pos_ms), highlight_end_ms(result, seconds),
+                         "highlight"});
+    }
+    for (size_t i = 0; i < result.beats_ms.size(); ++i) {
+        const auto at = static_cast<double>(result.beats_ms[i]);
+        marks.push_back({at, at, "beat " + std::to_string(i + 1)});
+    }
+    return marks;
 }

@@ -1,14 +1,25 @@
 // Marker files: what an editor imports, one file beside each song or in --output-dir.
 //
-// In: a record and the options. Out: the file's content, for worker.cpp to write. One writer a
-// format, in a file of its own (markers_*.cpp).
+// In: a record and the options. Out: the file's content, for worker.cpp to write.
 #ifndef TAVO_CLI_MARKERS_H
 #define TAVO_CLI_MARKERS_H
 
 #include <string>
+#include <vector>
 
 #include "cli/options.h"
 #include "cli/record.h"
+
+// The highlight, from its start to its end, or a beat, whose times are equal. Milliseconds from the
+// start of the song.
+struct mark {
+    double start_ms;
+    double end_ms;
+    std::string name;
+};
+
+// All marks of a song, the highlight first. It lasts as long as was asked for, else 30 s.
+std::vector<mark> marks_of(const record &result);
 
 // Whether the format writes a file for each input.
 bool writes_files(result_format format);
@@ -20,10 +31,16 @@ std::string marker_path(const std::string &input, const options &opts);
 // The file's whole content.
 std::string marker_content(const record &result, const options &opts);
 
-// Where the highlight's region ends: after --length, or after what a preview usually lasts.
-double region_end_ms(const record &result);
+// The writers.
+std::string audacity_labels(const record &result, const options &opts);
+std::string kdenlive_guides(const record &result, const options &opts);
+std::string losslesscut_segments(const record &result, const options &opts);
+std::string reaper_markers(const record &result, const options &opts);
+std::string ffmetadata_chapters(const record &result, const options &opts);
+std::string edl_markers(const record &result, const options &opts);
+std::string fcpxml_markers(const record &result, const options &opts);
 
-// One writer for each format.
-std::string label_track(const record &result, const options &opts);
+// Not a file: RIFF chunks for the end of the click track, with its cue points.
+std::string cue_chunks(const record &result);
 
 #endif

@@ -8,6 +8,7 @@
 #include <cstdio>
 #include <iostream>
 
+#include "cli/frame_rate.h"
 #include "cli/markers.h"
 #include "cli/words.h"
 #include "core/tavo.h"
@@ -44,11 +45,36 @@ int wrong_usage(const std::string &sentence) {
     return kExitUsage;
 }
 
+struct format_word {
+    const char *word;
+    result_format format;
+};
+constexpr format_word kFormats[] = {
+    {"text", result_format::text},
+    {"json", result_format::json},
+    {"csv", result_format::csv},
+    {"labels", result_format::labels},
+    {"kdenlive", result_format::kdenlive},
+    {"losslesscut", result_format::losslesscut},
+    {"ffmetadata", result_format::ffmetadata},
+    {"edl", result_format::edl},
+    {"fcpxml", result_format::fcpxml},
+    {"reaper", result_format::reaper},
+    {"cue", result_format::cue},
+};
+
+std::vector<std::string> format_words() {
+    std::vector<std::string> words;
+    for (const format_word &entry : kFormats) words.emplace_back(entry.word);
+    return words;
+}
+
 // Values that the parser takes as words.
 struct raw_values {
     std::string mode = "both";
     std::string format;  // empty: text, or none with a store
     std::string shard;
+    std::string fps;
     bool null_separated = false;
 };
 
@@ -105,16 +131,22 @@ void declare_analysis(CLI::App &app, options &out, raw_values &raw) {
 }
 
 void declare_output(CLI::App &app, options &out, raw_values &raw) {
-    app.add_option(
-           "-f,--format", raw.format,
-           "text (default) for people, json: one object a line,\ncsv: one row a file; or a file of "
-           "markers for each input:\nlabels for Audacity, FILE.labels.txt. Markers span 30 s of\n"
-           "highlight without --length")
-        ->check(CLI::IsMember({"text", "json", "csv", "labels"}).description(""))
+    app.add_option("-f,--format", raw.format,
+                   "text (default) for people, json: one object a line,\ncsv: one row a file; or "
+                   "markers for an editor, a file beside\neach input: labels (Audacity), kdenlive, "
+                   "losslesscut,\nffmetadata (chapters), edl (DaVinci Resolve), fcpxml,\nreaper; "
+                   "or cue: inside the track of --click. Markers\nspan 30 s of highlight without "
+                   "--length")
+        ->check(CLI::IsMember(format_words()).description(""))
         ->type_name("FORMAT");
     app.add_option("-o,--output-dir", out.output_dir,
                    "Folder for the marker files; by default they are\nwritten beside each file")
         ->type_name("DIR");
+    app.add_option("--fps", raw.fps,
+                   "Frames a second for edl and fcpxml: 23.976, 24, 25,\n29.97, 29.97df "
+                   "(drop-frame), 30 (default), 50, 59.94,\n59.94df, 60")
+        ->check(CLI::IsMember(frame_rate_names()).description(""))
+        ->type_name("RATE");
     app.add_flag("--force", out.force,
                  "Overwrite marker files, click tracks and pictures\nthat exist");
     app.add_flag("--skip-existing", out.skip_existing, "Leave out inputs whose marker file exists");
@@ -192,11 +224,11 @@ bool is_folder(const std::string &path) {
 
 void set_values(const raw_values &raw, options &out) {
     out.mode = mode_of(raw.mode);
-    out.format = raw.format == "json"                       ? result_format::json
-                 : raw.format == "csv"                      ? result_format::csv
-                 : raw.format == "labels"                   ? result_format::labels
-                 : raw.format.empty() && !out.store.empty() ? result_format::none
-                                                            : result_format::text;
+    if (raw.format.empty() && !out.store.empty()) out.format = result_format::none;
+    for (const format_word &entry : kFormats) {
+        if (raw.format == entry.word) out.format = entry.format;
+    }
+    if (!raw.fps.empty()) out.fps = raw.fps;
     for (std::string *path : {&out.click, &out.plot, &out.report, &out.store, &out.forecast}) {
         unshield(*path);
     }
@@ -224,17 +256,24 @@ std::string catalogue_contradiction(const options &out) {
 }
 
 // What is wrong with options that are right by themselves. Empty when all is well.
-std::string contradiction(const options &out, bool null_separated) {
+std::string contradiction(const options &out, const raw_values &raw) {
     const bool list_on_stdin =
         std::find(out.inputs.begin(), out.inputs.end(), "-") != out.inputs.end();
     if (out.inputs.empty() && out.lists.empty() && !out.from_store && out.forecast.empty()) {
         return "name at least one audio file, a folder, or '-' for a list on standard input.";
     }
-    if (null_separated && !list_on_stdin && out.lists.empty()) {
+    if (raw.null_separated && !list_on_stdin && out.lists.empty()) {
         return "-0 is about lists of files: give '-' or --files-from.";
     }
     if (!out.output_dir.empty() && !writes_files(out.format)) {
         return "--output-dir goes with the formats that write files, like --format labels.";
+    }
+    if (!raw.fps.empty() && out.format != result_format::edl &&
+        out.format != result_format::fcpxml) {
+        return "--fps goes with --format edl and fcpxml, which count in frames.";
+    }
+    if (out.format == result_format::cue && out.click.empty()) {
+        return "--format cue marks the track of --click: give both.";
     }
     if (out.skip_existing && !writes_files(out.format)) {
         return "--skip-existing goes with the formats that write files, like --format labels.";
@@ -296,7 +335,7 @@ std::optional<int> parse_options(int argc, char **argv, options &out) {
         return wrong_usage(wrong.what());
     }
     set_values(raw, out);
-    std::string sentence = contradiction(out, raw.null_separated);
+    std::string sentence = contradiction(out, raw);
     if (sentence.empty() && !raw.shard.empty()) sentence = read_shard(raw.shard, out.share);
     if (!sentence.empty()) return wrong_usage(sentence);
     write_notes(out);

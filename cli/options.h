@@ -9,7 +9,21 @@
 
 #include "cli/shard.h"
 
-enum class result_format { none, text, json, csv, labels };
+enum class result_format {
+    none,  // nothing: the store has the results
+    text,
+    json,
+    csv,
+    // marker files
+    labels,
+    kdenlive,
+    losslesscut,
+    ffmetadata,
+    edl,
+    fcpxml,
+    reaper,
+    cue,  // inside the click track
+};
 
 struct options {
     int32_t mode = 0;       // TAVO_MODE_*
@@ -21,6 +35,7 @@ struct options {
     std::string report;      // where the page goes, empty for none
     bool embed = false;      // the sound goes into the page
     std::string output_dir;  // of marker files; empty: beside each input
+    std::string fps = "30";  // of the formats that count in frames, frame_rate.h
     bool force = false;
     bool skip_existing = false;
     bool quiet = false;

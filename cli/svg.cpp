@@ -39,6 +39,12 @@ std::string xml(const std::string &bytes) {
     return out;
 }
 
+std::string xml_attribute(const std::string &bytes) {
+    std::string out;
+    for (const char c : xml(bytes)) out += c == '"' ? std::string("&quot;") : std::string(1, c);
+    return out;
+}
+
 std::string opened(const char *name, const attributes &with) {
     std::string out = std::string("<") + name;
     for (const auto &[key, value] : with) out += std::string(" ") + key + "=\"" + value + "\"";

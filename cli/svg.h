@@ -16,6 +16,7 @@ std::string point(double x, double y);
 // Text for an element: escaped, and what XML does not have becomes U+FFFD, as bytes that are no
 // characters do.
 std::string xml(const std::string &bytes);
+std::string xml_attribute(const std::string &bytes);
 
 // The start of an element, up to before its closing bracket; a whole one without content.
 std::string opened(const char *name, const attributes &with);

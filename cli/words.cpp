@@ -37,8 +37,9 @@ const char *status_word(outcome status) {
     return "failed";
 }
 
-std::string whole_clock_text(double ms) {
-    const long long whole = std::llround(ms / 1000.0);
+namespace {
+
+std::string seconds_text(long long whole) {
     std::array<char, 48> text{};
     if (whole >= 3600) {
         snprintf(text.data(), text.size(), "%lld:%02lld:%02lld", whole / 3600, whole / 60 % 60,
@@ -49,10 +50,15 @@ std::string whole_clock_text(double ms) {
     return text.data();
 }
 
+}  // namespace
+
+std::string whole_clock_text(double ms) {
+    return seconds_text(std::llround(ms / 1000.0));
+}
+
 std::string clock_text(double ms) {
     const long long tenths = std::llround(ms / 100.0);
-    return whole_clock_text(static_cast<double>(tenths / 10 * 1000)) + "." +
-           std::to_string(tenths % 10);
+    return seconds_text(tenths / 10) + "." + std::to_string(tenths % 10);
 }
 
 std::string highlight_text(const record &result) {

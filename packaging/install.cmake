@@ -35,6 +35,8 @@ if(TARGET tavo_command)
   install(FILES packaging/tavo.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
   install(FILES packaging/tavo.bash RENAME tavo
     DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
+  install(FILES packaging/tavo.zsh RENAME _tavo DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions)
+  install(FILES packaging/tavo.fish DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d)
 endif()
 
 install(FILES README.md CHANGELOG.md packaging/copyright DESTINATION ${CMAKE_INSTALL_DOCDIR})

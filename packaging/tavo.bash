@@ -16,7 +16,10 @@ _tavo() {
     fi
     case $before in
         -m | --mode) mapfile -t COMPREPLY < <(compgen -W 'highlight beats both' -- "$word") ;;
-        -f | --format) mapfile -t COMPREPLY < <(compgen -W 'text json csv labels' -- "$word") ;;
+        -f | --format) mapfile -t COMPREPLY < <(compgen -W 'text json csv labels kdenlive
+            losslesscut ffmetadata edl fcpxml reaper cue' -- "$word") ;;
+        --fps) mapfile -t COMPREPLY < <(compgen -W '23.976 24 25 29.97 29.97df 30 50 59.94
+            59.94df 60' -- "$word") ;;
         --shard) mapfile -t COMPREPLY < <(compgen -W 'auto' -- "$word") ;;
         -o | --output-dir) mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
         -l | --length | -j | --jobs | --max-beats | --patience | --sample | --files | --cores | --bandwidth) ;; # a number
@@ -25,7 +28,7 @@ _tavo() {
             if [[ $word == -* ]]; then
                 mapfile -t COMPREPLY < <(compgen -W '-h --help --version
                     -m --mode -l --length --max-beats -j --jobs
-                    -f --format -o --output-dir --force --skip-existing --click --plot --report --embed -q --quiet
+                    -f --format -o --output-dir --fps --force --skip-existing --click --plot --report --embed -q --quiet
                     -r --recursive --files-from -0 --null
                     --store --retry-failed --redo --from-store --patience --shard
                     --forecast --sample --files --cores --bandwidth' -- "$word")

@@ -14,7 +14,7 @@ tests=(
   libgtest-dev libbenchmark-dev
   python3 python3-numpy python3-selenium chromium chromium-driver sqlite3 clang-format clang-tidy
   ffmpeg flac lame vorbis-tools
-  doxygen groff-base
+  doxygen groff-base zsh fish
 )
 cluster=(slurm-wlm munge postgresql postgresql-client) # scripts/test-cluster.sh
 fuzz=(clang libclang-rt-14-dev)

@@ -35,22 +35,6 @@ class Outputs(Case):
         self.assertEqual(struct.unpack("<I", track[40:44])[0], len(track) - 44)
         self.assertGreater(max(struct.unpack(f"<{(len(track) - 44) // 2}h", track[44:])), 3000)
 
-    def test_labels(self):
-        self.put("song.wav", source=standard_song())
-        for arguments, seconds in (([], 30.0), (["--length", "12"], 12.0)):
-            (result,) = self.run_json(*arguments, "song.wav")
-            self.run_tavo(*LABELS[0], "--force", *arguments, "song.wav")
-            start = result["hl_pos_ms"] / 1000
-            expected = [(start, min(start + seconds, 60.0), "highlight")]
-            expected += [(ms / 1000, ms / 1000, f"beat {i}")
-                         for i, ms in enumerate(result["beats_ms"], 1)]
-            lines = (self.folder / LABELS[1]).read_text().splitlines()
-            for line, (begin, end, name) in zip(lines, expected, strict=True):
-                track = line.split("\t")
-                self.assertEqual(track[2], name)
-                self.assertAlmostEqual(float(track[0]), begin, places=5)
-                self.assertAlmostEqual(float(track[1]), end, places=5)
-
     def test_what_exists_stays(self):
         for arguments, name, mark in ((*LABELS, b"highlight"), (*PICTURE, b"highlight"),
                                       (*CLICK, b"RIFF")):

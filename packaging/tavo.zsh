@@ -1,0 +1,21 @@
+#compdef tavo
+# Completion of the command tavo for zsh.
+_arguments -s -S \
+  '(-h --help)'{-h,--help}'[print the options and end]' \
+  '--version[print the version and end]' \
+  '(-m --mode)'{-m+,--mode=}'[what to find]:mode:(highlight beats both)' \
+  '(-l --length)'{-l+,--length=}'[length of the highlight wanted]:seconds:' \
+  '--max-beats=[maximum number of threshold-selected beats]:number:' \
+  '(-j --jobs)'{-j+,--jobs=}'[files analysed at once]:number:' \
+  '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive losslesscut ffmetadata edl fcpxml reaper cue)' \
+  '(-o --output-dir)'{-o+,--output-dir=}'[folder for the marker files]:folder:_files -/' \
+  '--fps=[frames a second for edl and fcpxml]:rate:(23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60)' \
+  '--force[overwrite files that exist]' \
+  '--skip-existing[leave out inputs whose marker file exists]' \
+  '--click=[write the sound with a click on every beat]:WAV file:_files' \
+  '--plot=[draw the result]:SVG file:_files' \
+  '(-q --quiet)'{-q,--quiet}'[no progress bar and no notes]' \
+  '(-r --recursive)'{-r,--recursive}'[search folders inside folders too]' \
+  '*--files-from=[take names from a list]:list:_files' \
+  '(-0 --null)'{-0,--null}'[names in lists end with a NUL]' \
+  '*:audio file or folder:_files'
