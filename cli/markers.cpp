@@ -49,12 +49,15 @@ std::string marker_content(const record &result, const options &opts) {
     return find_format(opts.format)->content(result, opts);
 }
 
+double region_end_ms(const record &result) {
+    return highlight_end_ms(result, result.length_s > 0 ? result.length_s : kUsualLengthSeconds);
+}
+
 std::vector<mark> marks_of(const record &result) {
     std::vector<mark> marks;
     if (result.has_highlight) {
-        const int32_t seconds = result.length_s > 0 ? result.length_s : kUsualLengthSeconds;
-        marks.push_back({static_cast<double>(result.hl_pos_ms), highlight_end_ms(result, seconds),
-                         "highlight"});
+        const auto start_ms = static_cast<double>(result.hl_pos_ms);
+        marks.push_back({start_ms, region_end_ms(result), "highlight"});
     }
     for (size_t i = 0; i < result.beats_ms.size(); ++i) {
         const auto at = static_cast<double>(result.beats_ms[i]);

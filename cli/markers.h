@@ -18,7 +18,10 @@ struct mark {
     std::string name;
 };
 
-// All marks of a song, the highlight first. It lasts as long as was asked for, else 30 s.
+// Where the highlight's region ends: after --length, or after what a preview usually lasts.
+double region_end_ms(const record &result);
+
+// All marks of a song, the highlight first.
 std::vector<mark> marks_of(const record &result);
 
 // Whether the format writes a file for each input.

@@ -18,4 +18,17 @@ _arguments -s -S \
   '(-r --recursive)'{-r,--recursive}'[search folders inside folders too]' \
   '*--files-from=[take names from a list]:list:_files' \
   '(-0 --null)'{-0,--null}'[names in lists end with a NUL]' \
+  '--report=[write a page that shows and plays the result]:file:_files' \
+  '--embed[put the sound into the page]' \
+  '--store=[keep the results in a database]:file:_files' \
+  '--retry-failed[analyse songs again that failed]' \
+  '--redo[analyse every song again]' \
+  '--from-store[write out what the store holds]' \
+  '--patience=[seconds that a store without an answer is tried again]:number:' \
+  '--shard=[only a share of the inputs, I/N]:share:(auto)' \
+  '--forecast=[say what a list of files needs]:file:_files' \
+  '--sample=[files in the sample of a forecast]:number:' \
+  '--files=[files to forecast for]:number:' \
+  '--cores=[processors to forecast for]:number:' \
+  '--bandwidth=[speed of the storage to forecast for, MB/s]:number:' \
   '*:audio file or folder:_files'
