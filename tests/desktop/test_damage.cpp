@@ -171,7 +171,8 @@ TEST(Claims, OfTooMuchAreNotBelieved) {
         {"first.m4a", "stco", 8, {0x7F, 0xFF, 0xFF, 0xFF}},   // chunks
         {"first.m4a", "stsc", 16, {0x7F, 0xFF, 0xFF, 0xFF}},  // frames in a chunk
         {"fragmented.mp4", "trun", 8, {0xFF, 0xFF, 0xFF, 0xFF}},
-        {"no_table.flac", "fLaC", 21, {0xF5, 0xFF, 0xFF, 0xFF, 0xFF}},  // samples
+        {"fragmented.mp4", "trun", 4, {0, 0, 0, 0, 0xFF, 0xFF, 0xFF, 0xFF}},  // of unstated sizes
+        {"no_table.flac", "fLaC", 21, {0xF5, 0xFF, 0xFF, 0xFF, 0xFF}},        // samples
         {"song.wav", "data", 4, {0xF0, 0xFF, 0xFF, 0xFF}},
     };
     std::mt19937 random(3);

@@ -3,7 +3,6 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "media_source/format_table.h"
 #include "tests/desktop/codec_test.h"
 
 namespace codec_test {
@@ -98,8 +97,7 @@ TEST(Flac, RoundsTwentyFourBits) {
     EXPECT_EQ(opened(fixture("wide.flac")).format.sample_rate, 96000);
 }
 
-// The headers say 22,050 Hz; decoding says 44,100 Hz, 2048 samples a frame. A mono stream comes out
-// as two equal channels.
+// The headers say 22,050 Hz; decoding says 44,100 Hz, 2048 samples a frame.
 TEST(Aac, LearnsTheTruthFromTheFrames) {
     for (const char *name : {"golden/he_every.aac", "golden/he.aac", "golden/he.m4a"}) {
         const opened file(fixture(name));
@@ -107,26 +105,11 @@ TEST(Aac, LearnsTheTruthFromTheFrames) {
         EXPECT_EQ(file.format.sample_rate, 44100);
         EXPECT_EQ(file.format.duration * 44100 / kUnits % 2048, 0);
     }
-    const std::string path = fixture("mono.aac");
-    const mtsrc_io io = io_for(path);
-    int64_t word = 0;
-    xaac_info info = {};
-    void *reader = xaacfd_create(&io, &word, &info, nullptr);
-    ASSERT_NE(reader, nullptr);
-    EXPECT_EQ(info.channels, 1);
-    const xaac_config config = {{1, 2, 2, 0}, 3, info.sample_rate, info.channels, 0};
-    void *decoder = xaacd_create(&config, nullptr);
-    EXPECT_EQ(aac_get_hz(reader, decoder), 44100);
-    samples pcm(12288);
-    int32_t size = 0;
-    int64_t first = 0;
-    int64_t length = 0;
-    ASSERT_EQ(xaacfd_get_frm(reader, pcm.data(), 24576, &size, &first, &length), 0);
-    EXPECT_EQ(size, 4096);
-    EXPECT_EQ(first, 232'200);  // 1024 samples, rounded up
-    for (size_t i = 0; i < 1024; ++i) ASSERT_EQ(pcm[2 * i], pcm[2 * i + 1]);
-    xaacd_delete(decoder);
-    xaacfd_delete(reader);
+    // Frames that lost their replication data keep their length, also where a new decoder starts.
+    const samples he = read_all(fixture("golden/he.aac"));
+    for (size_t at = 256 * 2048; at < he.size(); at += 1024) {
+        EXPECT_TRUE(std::any_of(&he[at], &he[at] + 1024, [](int16_t s) { return s != 0; })) << at;
+    }
 }
 
 // Where a new decoder starts, every few seconds, nothing is to be heard. This file has no
@@ -208,21 +191,19 @@ TEST(LossyFiles, HaveTheSongInItsPlace) {
     }
 }
 
-// The file delivers one byte at a time to the readers; recognition, which opens it first, asks for
-// whole heads.
-mtsrc_file *recognised;
-
-int64_t read_a_byte(mtsrc_file *file, void *buf, int32_t count) {
-    return mtsrc_file_read(file, buf, file == recognised ? count : std::min(count, 1));
-}
-
+// The readers get one byte at a time; recognition, which opens the file first, asks for whole
+// heads.
 TEST(Files, MayDeliverOneByteAtATime) {
+    static mtsrc_file *recognised;
     for (const char *name :
          {"song.wav", "cbr.mp3", "song.flac", "low.aac", "last.m4a", "song.ogg"}) {
         SCOPED_TRACE(name);
-        mtsrc_io io = io_for(fixture(name));
-        io.path = strdup(fixture(name).c_str());  // the source's, once it is open
-        io.read = read_a_byte;
+        const std::string path = fixture(name);
+        mtsrc_io io = io_for(path);
+        io.path = strdup(path.c_str());  // the source's, once it is open
+        io.read = [](mtsrc_file *file, void *buf, int32_t count) {
+            return mtsrc_file_read(file, buf, file == recognised ? count : std::min(count, 1));
+        };
         io.open = [](const mtsrc_io *of, int32_t mode) {
             mtsrc_file *opened = mtsrc_file_open(of, mode);
             if (recognised == nullptr) recognised = opened;
@@ -232,7 +213,7 @@ TEST(Files, MayDeliverOneByteAtATime) {
         int32_t err = 0;
         mtsrc_ctx *source = mtsrc_open_mfal(&io, 0, &err);
         ASSERT_NE(source, nullptr) << err;
-        expect_same(read(source, SIZE_MAX), read_all(fixture(name)));
+        expect_same(read(source, SIZE_MAX), read_all(path));
         mtsrc_deinit(source);
     }
 }
@@ -271,34 +252,7 @@ TEST(MpegAudio, PassesTagsAndGarbage) {
                 read_all(fixture("golden/plain.ogg")));
 }
 
-// The sound beside a picture is read, and has its own duration.
-TEST(Video, IsNotOpened) {
-    const std::string paths[] = {fixture("video.mp4"), fixture("video.ogv")};
-    mtsrc_io io = io_for(paths[0]);
-    int32_t short_word = 0;
-    xmp4_info mp4 = {};
-    void *file = xmp4fd_create(&io, &short_word, &mp4, nullptr);
-    ASSERT_NE(file, nullptr);
-    EXPECT_EQ(mp4.track_count, 2);
-    EXPECT_EQ(get_mp4_audiostream(&mp4), 1);
-    for (const int32_t index : {-1, 0, 2}) EXPECT_EQ(xmp4fds_open(file, index, nullptr), nullptr);
-    EXPECT_NE(xmp4fds_open(file, 1, nullptr), nullptr);
-    EXPECT_EQ(mp4.duration, opened(fixture("low.aac")).format.duration);
-    xmp4fd_delete(file);
-
-    io = io_for(paths[1]);
-    int64_t word = 0;
-    xogg_info ogg = {};
-    file = xoggd_create(&io, &word, &ogg, nullptr);
-    ASSERT_NE(file, nullptr);
-    EXPECT_EQ(ogg.stream_count, 2);
-    EXPECT_EQ(get_ogg_audiostream(&ogg), 1);
-    for (const int32_t index : {-1, 0, 2}) EXPECT_EQ(xoggds_open(file, index, nullptr), nullptr);
-    EXPECT_NE(xoggds_open(file, 1, nullptr), nullptr);
-    xoggd_delete(file);
-}
-
-// Other codecs, free format, and files that have nothing of a format but its first bytes.
+// Other codecs, and files that have nothing of a format but its first bytes.
 TEST(Files, ThatCannotBeReadAreRefused) {
     EXPECT_EQ(opened(fixture("alac.m4a")).error, -3);
     EXPECT_EQ(opened(fixture("silent.mp4")).error, -7);
