@@ -7,12 +7,16 @@
 
 #include <cstdint>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "cli/options.h"
 #include "cli/record.h"
 
 constexpr int kPlotColumns = 1000;  // pixels of the time axis
+
+constexpr double kPointMs = 2000.0;   // from one loudness value to the next
+constexpr double kWindowMs = 6000.0;  // that a loudness value is about
 
 // The least and the greatest sample of a stretch.
 struct extent {
@@ -42,6 +46,10 @@ void draw_plot(record &result, const options &opts, int stop_fd);
 // for analyse.
 outcome gather_plot(const record &result, int columns, int stop_fd, plot_data &out,
                     std::string &error);
+
+// Where a rise counts as the entry of a highlight, milliseconds from first to second. The last
+// window that is looked at may hold a rise at its very end. Needs a loudness curve.
+std::pair<double, double> searched_span(const record &result, const plot_data &data);
 
 // The whole SVG document, UTF-8.
 std::string plot_svg(const record &result, const plot_data &data);

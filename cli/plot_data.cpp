@@ -10,6 +10,7 @@
 #include "cli/plot.h"
 #include "common/tavo_ctx.h"
 #include "highlight/power_envelope.h"
+#include "highlight/search.h"
 #include "media_source/mtsrc.h"
 
 namespace {
@@ -167,4 +168,12 @@ outcome gather_plot(const record &result, int columns, int stop_fd, plot_data &o
     }
     fill_plot(result, from, columns, out);
     return outcome::ok;
+}
+
+std::pair<double, double> searched_span(const record &result, const plot_data &data) {
+    const bool is_short = result.duration_ms / 1000 < kShortSongSeconds;
+    const double tail = is_short ? kShortSearchTail : kSearchTail;
+    const double from = is_short ? 0.0 : kSearchSkip * kPointMs;
+    const double last = static_cast<double>(data.loudness.size()) - tail;
+    return {from, last < 0.0 ? from : std::max(from, last * kPointMs + kWindowMs)};
 }

@@ -7,7 +7,6 @@
 #include "cli/plot.h"
 #include "cli/svg.h"
 #include "cli/words.h"
-#include "highlight/search.h"
 
 namespace {
 
@@ -46,8 +45,6 @@ constexpr double kCharacter = 0.615;  // a generous width in any sans-serif font
 constexpr double kSkewMs = 1000.0;    // stated and read lengths that differ more are both told
 constexpr double kHourMs = 3.6e6;
 constexpr double kFullScale = 32768.0;
-constexpr double kPointMs = 2000.0;   // from one loudness value to the next
-constexpr double kWindowMs = 6000.0;  // that a loudness value is about
 
 // Okabe and Ito's colours, which differ in lightness too. kDark replaces some where the viewer
 // prefers a dark ground; a viewer that knows no style sheets shows the light picture.
@@ -151,15 +148,10 @@ std::string lane_title(const record &result, const plot_data &data, const lane &
     return text_at(crossed ? kRight : kLeft, of.title, crossed ? "end" : "start", words);
 }
 
-// Shades the start and the end of the song, where no rise counts as the entry of a highlight. The
-// last window that is looked at may hold a rise at its very end.
+// Shades the start and the end of the song, where no rise counts as the entry of a highlight.
 std::string unsearched(const record &result, const plot_data &data) {
     if (!result.has_highlight || data.loudness.empty()) return "";
-    const bool is_short = result.duration_ms / 1000 < kShortSongSeconds;
-    const double tail = is_short ? kShortSearchTail : kSearchTail;
-    const double from = is_short ? 0.0 : kSearchSkip * kPointMs;
-    const double last = static_cast<double>(data.loudness.size()) - tail;
-    const double to = last < 0.0 ? from : std::max(from, last * kPointMs + kWindowMs);
+    const auto [from, to] = searched_span(result, data);
     const auto box = [&](double start_ms, double end_ms) {
         const double start = x_of(data, start_ms);
         return "M" + point(start, kMarkY) + "H" + decimal(x_of(data, end_ms), 1) + "V" +

@@ -162,6 +162,7 @@ std::string report_page(const record &result, const plot_data &data, const repor
                         {"mean", data.mean}};
     if (result.has_highlight) {
         song["hl_pos_ms"] = result.hl_pos_ms;
+        if (!data.loudness.empty()) song["searched_ms"] = searched_span(result, data);
         song["region_end_ms"] = region_end_ms(result);
         if (result.length_s > 0) song["hl_end_ms"] = song["region_end_ms"];
         if (has_refinement(result)) song["hl_refined"] = is_refined(result);

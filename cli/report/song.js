@@ -55,9 +55,18 @@ function drawLoudness() {
   }
 }
 
+function box(kind, from, to) {
+  shape("rect", { class: kind, x: from, y: 0, width: Math.max(0, to - from), height: 100 });
+}
+
 function draw() {
+  if (song.searched_ms) {
+    box("unsearched", 0, song.searched_ms[0]);
+    box("unsearched", song.searched_ms[1], song.length_ms);
+  }
+  byId("unsearched").hidden = !song.searched_ms;
   if (hasHighlight) {
-    shape("rect", { class: "region", x: song.hl_pos_ms, y: 0, width: Math.max(0, loopEnd - song.hl_pos_ms), height: 100 });
+    box("region", song.hl_pos_ms, loopEnd);
   }
   drawWave();
   drawLoudness();
@@ -77,7 +86,8 @@ function drawTicks() {
   for (let t = Math.ceil(view.from / step) * step; t <= view.to; t += step) {
     const label = document.createElement("span");
     label.textContent = step < 1000 ? clock(t) : clock(t).replace(/\.\d$/, "");
-    label.style.left = `${Math.min(98, Math.max(2, 100 * (t - view.from) / span))}%`;
+    const x = timeline.clientWidth * (t - view.from) / span;
+    label.style.left = `${Math.min(timeline.clientWidth - 18, Math.max(18, x))}px`;  // half a label
     ticks.push(label);
   }
   byId("times").replaceChildren(...ticks);
