@@ -17,9 +17,9 @@ constexpr int64_t kRows = 3;              // mel rows kept by a part: the pair's
 
 // One worker's share of the frames.
 struct onset_part {
-    TAVO_ONSET_WORKER worker;     // spectrum and mel null: no row outlives its frame
-    double full_scale;            // of the worker's signal
-    const pair_tables *tables;    // null: frames go one by one
+    const TAVO_ONSET_WORKER *worker;  // spectrum and mel null: no row outlives its frame
+    double full_scale;                // of the worker's signal
+    const pair_tables *tables;        // null: frames go one by one
     double *env;                  // [F - 1] change from each frame to the next; null: not wanted
     double first_row[kMelBands];  // decibels of the first frame, with env
     double last_row[kMelBands];   // of the last one
@@ -39,6 +39,7 @@ struct part_room {
 
 // The four parts of one envelope and what they share; zero before anything is obtained.
 struct onset_run {
+    TAVO_ONSET_WORKER workers[kBeatWorkers];
     onset_part parts[kBeatWorkers];
     int32_t done[kBeatWorkers];
     double *window;  // [N]
@@ -72,9 +73,9 @@ bool obtain_run(onset_run *run, int32_t frame_size, float *const *mel_matrix) {
 }
 
 bool obtain_room(const onset_part *part, part_room *room) {
-    const int64_t size = part->worker.frame_size;
-    const int64_t bands = part->worker.band_count;
-    const int64_t ahead = part->tables != nullptr ? part->worker.hop_size : 0;
+    const int64_t size = part->worker->frame_size;
+    const int64_t bands = part->worker->band_count;
+    const int64_t ahead = part->tables != nullptr ? part->worker->hop_size : 0;
     room->samples = zeroed_items<double>(ahead + 4 * size + kRows * bands);
     if (room->samples == nullptr) return false;
     room->re = room->samples + ahead + size;
@@ -86,7 +87,7 @@ bool obtain_room(const onset_part *part, part_room *room) {
 
 // The scaled samples of frame k and the frames behind it, count in all.
 const double *hold_samples(const onset_part *part, part_room *room, int64_t k, int64_t count) {
-    const TAVO_ONSET_WORKER *worker = &part->worker;
+    const TAVO_ONSET_WORKER *worker = part->worker;
     const int64_t begin = k * worker->hop_size;
     const int64_t end = begin + (count - 1) * worker->hop_size + worker->frame_size;
     const int64_t kept = room->end > begin ? room->end - begin : 0;
@@ -101,13 +102,13 @@ const double *hold_samples(const onset_part *part, part_room *room, int64_t k, i
 }
 
 double *mel_row(const onset_part *part, const part_room *room, int64_t k) {
-    if (part->worker.mel != nullptr) return part->worker.mel[k];
-    return room->rows + k % kRows * part->worker.band_count;
+    if (part->worker->mel != nullptr) return part->worker->mel[k];
+    return room->rows + k % kRows * part->worker->band_count;
 }
 
 // The windowed power spectrum of frame k and its mel bands.
 void take_single(const onset_part *part, part_room *room, int64_t k) {
-    const TAVO_ONSET_WORKER *worker = &part->worker;
+    const TAVO_ONSET_WORKER *worker = part->worker;
     const double *samples = hold_samples(part, room, k, 1);
     for (int32_t i = 0; i < worker->frame_size; ++i) room->re[i] = samples[i] * worker->window[i];
     tavo_fft_proc(room->re, room->im, static_cast<int16_t>(worker->frame_size), worker->fft);
@@ -123,9 +124,9 @@ void take_single(const onset_part *part, part_room *room, int64_t k) {
 
 // The mel bands of the frames from k on; returns of how many, one or two.
 int64_t take_bands(const onset_part *part, part_room *room, int64_t k) {
-    if (part->tables != nullptr && k < part->worker.last) {
+    if (part->tables != nullptr && k < part->worker->last) {
         const double *samples = hold_samples(part, room, k, 2);
-        if (take_pair(part->tables, samples, samples + part->worker.hop_size,
+        if (take_pair(part->tables, samples, samples + part->worker->hop_size,
                       mel_row(part, room, k), mel_row(part, room, k + 1))) {
             return 2;
         }
@@ -147,20 +148,20 @@ double band_change(const double *now, const double *next) {
 // Turns the bands of frame k into decibels and compares them with the frame before.
 void finish_row(onset_part *part, const part_room *room, int64_t k) {
     double *row = mel_row(part, room, k);
-    for (int32_t b = 0; b < part->worker.band_count; ++b) {
+    for (int32_t b = 0; b < part->worker->band_count; ++b) {
         row[b] = 20.0 * log10(row[b] < kPowerFloor ? kPowerFloor : row[b]);
     }
     if (part->env == nullptr) return;
-    if (k > part->worker.first) part->env[k - 1] = band_change(mel_row(part, room, k - 1), row);
-    if (k == part->worker.first) std::copy_n(row, kMelBands, part->first_row);
-    if (k == part->worker.last) std::copy_n(row, kMelBands, part->last_row);
+    if (k > part->worker->first) part->env[k - 1] = band_change(mel_row(part, room, k - 1), row);
+    if (k == part->worker->first) std::copy_n(row, kMelBands, part->first_row);
+    if (k == part->worker->last) std::copy_n(row, kMelBands, part->last_row);
 }
 
 void run_part(void *record) {
     auto *part = static_cast<onset_part *>(record);
     part_room room = {};
     if (!obtain_room(part, &room)) return;
-    for (int64_t k = part->worker.first; k <= part->worker.last;) {
+    for (int64_t k = part->worker->first; k <= part->worker->last;) {
         const int64_t taken = take_bands(part, &room, k);
         for (const int64_t end = k + taken; k < end; ++k) finish_row(part, &room, k);
     }
@@ -168,8 +169,13 @@ void run_part(void *record) {
     free(room.samples);
 }
 
+void report_done(const TAVO_ONSET_WORKER *worker) {
+    worker_group_done(worker->mutex, worker->cond, worker->done_flags, worker->thread_count,
+                      worker->id);
+}
+
 void part_cleanup(void *record) {
-    _thd_cleanup(&static_cast<onset_part *>(record)->worker);
+    report_done(static_cast<const onset_part *>(record)->worker);
 }
 
 void *part_entry(void *record) {
@@ -179,7 +185,7 @@ void *part_entry(void *record) {
 // A caller's own record asks for its rows and nothing more.
 void run_onset_worker(void *record) {
     onset_part part = {};
-    part.worker = *static_cast<const TAVO_ONSET_WORKER *>(record);
+    part.worker = static_cast<const TAVO_ONSET_WORKER *>(record);
     part.full_scale = 1.0;
     run_part(&part);
 }
@@ -188,12 +194,13 @@ void fill_parts(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame_size, int32
                 onset_run *run) {
     const int64_t share = beat->frame_count / kBeatWorkers;
     for (int32_t id = 0; id < kBeatWorkers; ++id) {
+        TAVO_ONSET_WORKER *worker = &run->workers[id];
         onset_part *part = &run->parts[id];
+        part->worker = worker;
         part->full_scale = view.full_scale;
         part->tables = run->tables;
         part->env = beat->onset_env;
 
-        TAVO_ONSET_WORKER *worker = &part->worker;
         const bool is_last = id == kBeatWorkers - 1;
         worker->id = id;
         worker->signal = view.samples;
@@ -217,7 +224,7 @@ void fill_parts(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame_size, int32
 bool run_parts(onset_run *run, const side_work *beside) {
     worker_slot slots[kBeatWorkers];
     for (int32_t id = 0; id < kBeatWorkers; ++id) {
-        slots[id] = {&run->parts[id], &run->parts[id].worker.thread, part_entry, run_part};
+        slots[id] = {&run->parts[id], &run->workers[id].thread, part_entry, run_part};
     }
     worker_group_run(slots, kBeatWorkers, feat_mutex_mt, feat_cond_mt, run->done, beside);
     return std::all_of(run->parts, run->parts + kBeatWorkers,
@@ -229,8 +236,8 @@ bool run_parts(onset_run *run, const side_work *beside) {
 void finish_envelope(TAVO_BEAT_CTX *beat, const onset_run *run) {
     for (int32_t id = 0; id + 1 < kBeatWorkers; ++id) {
         const onset_part *part = &run->parts[id];
-        if (part->worker.first > part->worker.last) continue;
-        beat->onset_env[part->worker.last] =
+        if (part->worker->first > part->worker->last) continue;
+        beat->onset_env[part->worker->last] =
             band_change(part->last_row, run->parts[id + 1].first_row);
     }
     const int64_t count = beat->frame_count - 1;
@@ -243,9 +250,7 @@ void finish_envelope(TAVO_BEAT_CTX *beat, const onset_run *run) {
 }  // namespace
 
 void _thd_cleanup(void *record) {
-    const auto *worker = static_cast<const TAVO_ONSET_WORKER *>(record);
-    worker_group_done(worker->mutex, worker->cond, worker->done_flags, worker->thread_count,
-                      worker->id);
+    report_done(static_cast<const TAVO_ONSET_WORKER *>(record));
 }
 
 void *_tavo_proc_onsetenv(void *record) {
