@@ -3,9 +3,14 @@
 # golden results. SONGs, in any format that ffmpeg reads, are compared with this machine's results as
 # well.
 set -eu
+for song in "$@"; do
+    set -- "$@" "$(realpath "$song")"
+    shift
+done
+cd "$(dirname "$0")/.."
+bash scripts/setup.sh
 missing=
-for program in aarch64-linux-gnu-g++:g++-aarch64-linux-gnu qemu-aarch64:qemu-user \
-    cmake:cmake ninja:ninja-build javac:default-jdk-headless; do
+for program in aarch64-linux-gnu-g++:g++-aarch64-linux-gnu qemu-aarch64:qemu-user; do
     command -v "${program%%:*}" >/dev/null || missing="$missing ${program#*:}"
 done
 if [ -n "$missing" ]; then
@@ -14,7 +19,6 @@ if [ -n "$missing" ]; then
     # shellcheck disable=SC2086 # the packages are words
     DEBIAN_FRONTEND=noninteractive apt-get -qq -y install $missing >/dev/null
 fi
-cd "$(dirname "$0")/.."
 scripts/aarch64-sysroot.sh
 
 # This machine's songs, which the tests there take.
