@@ -16,8 +16,8 @@ constexpr double kLongest = 10.0;             // seconds of one file
 constexpr int64_t kMostMemory = 1024 * 1024;  // KiB of the whole program
 constexpr size_t kSlack = 2 * 4608;           // samples: two of the longest frames
 constexpr size_t kRecovery = 3 * 44'100;      // behind the damage, all is as before
-constexpr int kPlaces = 4;
-constexpr int kHeads = 60;
+constexpr int kPlaces = 3;
+constexpr int kHeads = 42;
 
 // Whether the end of the song comes out as before, behind damage.
 enum end_of_song {
@@ -72,7 +72,7 @@ samples read_consistently(const std::string &path, std::mt19937 *random) {
         const int64_t rate = file.format.sample_rate;
         const int64_t duration = file.format.duration;
         EXPECT_EQ(duration * rate / kUnits, static_cast<int64_t>(linear.size()));
-        for (int k = 0; k < 3; ++k) {
+        for (int k = 0; k < 2; ++k) {
             const auto position =
                 static_cast<int64_t>((*random)() % static_cast<uint64_t>(duration + kUnits));
             int64_t reached = -1;
@@ -123,7 +123,7 @@ TEST_P(Damage, StaysWhereItIs) {
             EXPECT_GE(same_front(got, whole) + kSlack, cut.size());
             const bool moved = kind == kJunk || kind == kTwice || kind == kLost;
             if (GetParam().end < (moved ? kAlways : kInPlace)) continue;
-            const samples rest = read_consistently(save("rest", part(file, 0, at + run)), &random);
+            const samples rest = read_all(save("rest", part(file, 0, at + run)));
             EXPECT_GE(same_end(got, whole) + kRecovery, whole.size() - rest.size());
         }
     }

@@ -137,7 +137,7 @@ void read_codec(const parser &p, span stsd) {
 // A frame without bytes is none. False when out of memory.
 bool add_frame(parser *p, int64_t offset, int64_t bytes) {
     if (bytes == 0) return true;
-    p->ended = offset < 0 || bytes > INT32_MAX || offset > p->file->size - bytes;
+    p->ended = offset < 0 || bytes < 0 || bytes > INT32_MAX || offset > p->file->size - bytes;
     return p->ended || frame_index_add(&p->info->frames, offset, static_cast<int32_t>(bytes), 0);
 }
 
@@ -188,9 +188,10 @@ tables load_tables(io_file *file, span stbl) {
     const int64_t same = plain.to > 0 ? value(t.sizes, 0, 4) : 0;
     t.size_bits = same > 0 ? 0 : plain.to > 0 ? 32 : static_cast<int32_t>(value(t.sizes, 3, 1));
     t.count = value(t.sizes, 4, 4);
-    if (same == 0 && t.size_bits >= 4)
-        t.count = std::min(t.count, (t.sizes.bytes - 8) * 8 / t.size_bits);
-    if (same == 0 && t.size_bits < 4) t.count = 0;
+    if (same == 0) {
+        const int64_t room = t.size_bits >= 4 ? (t.sizes.bytes - 8) * 8 / t.size_bits : 0;
+        t.count = std::min(t.count, room);
+    }
     return t;
 }
 
@@ -309,8 +310,8 @@ bool read_movie(parser *p, span moov) {
         const int32_t track = info->track_count++;
         const span media = find(file, trak.body, name_of("mdia"));
         const span handler = find(file, media, name_of("hdlr"));
-        if (handler.to == 0 || be32(file, handler.from + kFullHead + 4) != name_of("soun"))
-            continue;
+        const uint32_t kind = be32(file, handler.from + kFullHead + 4);
+        if (handler.to == 0 || kind != name_of("soun")) continue;
         info->kind[track] = kWexaKindAudio;
         if (info->track >= 0) continue;
         info->track = track;

@@ -97,12 +97,13 @@ int32_t stream_read(stream_reader *r, void *buf, int32_t size, int32_t *bytes, i
     const int64_t n = r->next - 1;
     const int32_t frame = info->out_channels * static_cast<int32_t>(sizeof(int16_t));
     if (samples > size / frame) return -1;
-    auto *pcm = static_cast<int16_t *>(buf);
+    auto *pcm = static_cast<int16_t *>(buf);  // [samples][out_channels]
     const int32_t from = r->skip + (n == info->cut_frame ? info->cut_samples : 0);
     const int32_t got =
         held > from ? r->library->pcm(r->decoder, info->out_channels, from, samples, pcm) : 0;
     *bytes = samples * frame;
-    memset(static_cast<uint8_t *>(buf) + got * frame, 0, static_cast<size_t>(*bytes - got * frame));
+    const ptrdiff_t written = int64_t{got} * info->out_channels;
+    memset(pcm + written, 0, static_cast<size_t>(samples - got) * static_cast<size_t>(frame));
     *first = units_from_samples(info->frames.entry[n].first + r->skip, info->rate);
     *second = units_from_samples(samples, info->rate);
     r->skip = 0;

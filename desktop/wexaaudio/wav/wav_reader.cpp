@@ -117,8 +117,8 @@ bool read_chunks(io_file *f, wav_head *head) {
 // Fills the record for the reasons of a refusal too. False when the header is too broken to say
 // anything: the record stays empty.
 bool fill_info(xwav_info *info, const wav_head *head) {
-    if (!head->has_format || head->channels == 0 || head->rate == 0 || head->rate > INT32_MAX)
-        return false;
+    const bool has_rate = head->rate > 0 && head->rate <= INT32_MAX;
+    if (!head->has_format || head->channels == 0 || !has_rate) return false;
     info->codec = head->tag == kTagPcm    ? kWexaPcm
                   : head->tag == kWexaPcm ? head->tag | kTagCollision
                                           : head->tag;
