@@ -233,9 +233,10 @@ int32_t xflacfd_seek(void *reader, const int64_t *position, int64_t *reached) {
     if (r == nullptr || position == nullptr || reached == nullptr) return -1;
     r->next = seek_target(*position, r->end, r->rate);
     *reached = units_from_samples(r->next, r->rate);
+    if (r->next >= r->end || find_sample(r, r->next)) return 0;
     // Where no seek leads, reading goes on from the start, up to the place.
-    const bool found = r->next >= r->end || find_sample(r, r->next) || rewind_stream(r);
-    return found ? 0 : -1;
+    r->file.failed = !rewind_stream(r);
+    return r->file.failed ? -1 : 0;
 }
 
 void xflacfd_delete(void *reader) {

@@ -7,7 +7,7 @@
 
 #include "media_source/mtsrc_io.h"
 
-constexpr int32_t kIoBlock = 262144;        // bytes read ahead
+constexpr int32_t kIoBlock = 65536;         // bytes read ahead
 constexpr int32_t kMaxLook = kIoBlock / 2;  // bytes that a look-ahead may ask for
 
 struct io_file {
