@@ -35,6 +35,7 @@ struct flac_reader {
     int64_t block;                 // its first sample
     int32_t count;                 // its sample frames; 0 without one
     bool damaged;                  // the frame being decoded has a wrong check sum
+    bool moved;                    // a seek came, and the decoder is elsewhere
 };
 static_assert(offsetof(flac_reader, flag) == kFlacReaderFlag);
 
@@ -210,6 +211,12 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
         return -1;
     }
     if (r->next >= r->end) return kWexaEndOfStream;
+    if (r->moved && !find_sample(r, r->next)) {
+        // Where no seek leads, reading goes on from the start, up to the place.
+        r->file.failed = false;
+        if (!rewind_stream(r)) return -1;
+    }
+    r->moved = false;
     bool more = true;
     while (more && (r->count == 0 || r->block + r->count <= r->next)) more = decode_block(r);
     if (r->file.failed) return -1;
@@ -233,10 +240,8 @@ int32_t xflacfd_seek(void *reader, const int64_t *position, int64_t *reached) {
     if (r == nullptr || position == nullptr || reached == nullptr) return -1;
     r->next = seek_target(*position, r->end, r->rate);
     *reached = units_from_samples(r->next, r->rate);
-    if (r->next >= r->end || find_sample(r, r->next)) return 0;
-    // Where no seek leads, reading goes on from the start, up to the place.
-    r->file.failed = !rewind_stream(r);
-    return r->file.failed ? -1 : 0;
+    r->moved = true;
+    return 0;
 }
 
 void xflacfd_delete(void *reader) {
