@@ -88,24 +88,6 @@ void convert(fuzz::input *in) {
 
 // --- 7: the highlight
 
-void find_valleys(fuzz::input *in) {
-    const auto mean = in->ConsumeProbability<float>();
-    const auto deviation = in->ConsumeProbability<float>();
-    const auto hop = in->ConsumeBool() ? 2.0f : in->ConsumeFloatingPointInRange(0.01f, 20.0f);
-    const auto curve = fuzz::values<float>(in, kMostPoints);
-    const double threshold = mean > 0.5f
-                                 ? static_cast<double>(mean) - 1.5 * static_cast<double>(deviation)
-                                 : static_cast<double>(mean - deviation);
-    const auto wanted = reference::valleys(curve, static_cast<float>(threshold),
-                                           static_cast<int32_t>(7.0 / static_cast<double>(hop)));
-    std::vector<int32_t> out(15, -7);
-    const int32_t count = tavo_find_valley(curve.data(), static_cast<int32_t>(curve.size()),
-                                           out.data(), mean, deviation, hop);
-    must(count == static_cast<int32_t>(wanted.size()), "as many valleys");
-    must(std::equal(wanted.begin(), wanted.end(), out.begin()), "the same valleys");
-    must(std::count(out.begin(), out.end(), -7) == 15 - count, "nothing behind them");
-}
-
 // count positions below n, ascending, of a list of at least room entries.
 std::vector<int32_t> take_positions(fuzz::input *in, size_t count, size_t room, int32_t n) {
     std::vector<int32_t> list(count);
@@ -169,26 +151,6 @@ struct analysis {
     }
 };
 
-void fill_gap(fuzz::input *in) {
-    const auto heights = fuzz::values<double>(in, 60);
-    const auto n = static_cast<int32_t>(heights.size());
-    if (std::any_of(heights.begin(), heights.end(), [](double x) { return std::isnan(x); })) return;
-    std::vector<int32_t> peaks;
-    for (int32_t at = 0; at < n; ++at) {
-        if (in->ConsumeIntegralInRange(0, 3) != 3) peaks.push_back(at);
-    }
-    const auto a = in->ConsumeIntegralInRange(-1, n + 1);
-    const auto b = in->ConsumeIntegralInRange(a, n + 2);
-    const auto most = in->ConsumeIntegralInRange<size_t>(0, 9);
-    const auto wanted = reference::between(a, b, peaks, most, heights);
-    std::vector<int32_t> out(most);
-    const int32_t found =
-        bringMoreBeat(a, b, out.data(), peaks.data(), static_cast<int32_t>(peaks.size()),
-                      static_cast<int32_t>(most), heights.data());
-    out.resize(static_cast<size_t>(found));
-    must(out == wanted, "the strongest peaks come back");
-}
-
 // From an envelope on: tempo, threshold, candidates, gaps. Values repeat.
 void place_beats(fuzz::input *in) {
     const int32_t limit = in->ConsumeIntegralInRange(-2, 40);
@@ -237,8 +199,6 @@ void place_beats(fuzz::input *in) {
 }  // namespace
 
 int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    fuzz::run_one(
-        {interpolate, convert, find_valleys, select_region, search_curve, fill_gap, place_beats},
-        data, size);
+    fuzz::run_one({interpolate, convert, select_region, search_curve, place_beats}, data, size);
     return 0;
 }

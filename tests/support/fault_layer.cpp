@@ -7,8 +7,6 @@
 #include <atomic>
 #include <cstdio>
 
-#include "media_source/mtsrc.h"
-
 namespace {
 
 fault::plan now;
@@ -23,16 +21,12 @@ bool fails(uint32_t call) {
     return true;
 }
 
-enum { kShown, kSeekIsNext, kHidden };
-std::atomic<int> landing{kShown};
-
 }  // namespace
 
 namespace fault {
 
 void arm(const plan &next) {
     count = failed = 0;
-    landing = kShown;
     now = next;
 }
 int64_t met() {
@@ -40,9 +34,6 @@ int64_t met() {
 }
 int64_t refused() {
     return failed;
-}
-void hide_landing() {
-    landing = kSeekIsNext;
 }
 
 }  // namespace fault
@@ -72,24 +63,3 @@ WRAP(kClose, int, close, (int fd), (fd), (__real_close(fd), -1))
 WRAP(kFopen, FILE *, fopen, (const char *path, const char *mode), (path, mode), nullptr)
 WRAP(kFwrite, size_t, fwrite, (const void *data, size_t size, size_t items, FILE *to),
      (data, size, items, to), 0)
-
-// The seek of the re-positioning, then the reads behind it.
-extern "C" {
-int32_t __real_mtsrc_seekstream(mtsrc_ctx *source, int64_t position, int64_t *reached);
-int32_t __real_mtsrc_getstream(mtsrc_ctx *source, int32_t want, mtsrc_frame *frame);
-int32_t __wrap_mtsrc_seekstream(mtsrc_ctx *source, int64_t position, int64_t *reached);
-int32_t __wrap_mtsrc_getstream(mtsrc_ctx *source, int32_t want, mtsrc_frame *frame);
-
-int32_t __wrap_mtsrc_seekstream(mtsrc_ctx *source, int64_t position, int64_t *reached) {
-    if (landing != kShown) landing = landing == kSeekIsNext ? kHidden : kShown;
-    return __real_mtsrc_seekstream(source, position, reached);
-}
-int32_t __wrap_mtsrc_getstream(mtsrc_ctx *source, int32_t want, mtsrc_frame *frame) {
-    const int32_t code = __real_mtsrc_getstream(source, want, frame);
-    auto *bytes = static_cast<uint8_t *>(frame->data);
-    for (int32_t i = 0; code >= 0 && landing == kHidden && i < frame->size; ++i) {
-        bytes[i] = static_cast<uint8_t>(i);  // in no song
-    }
-    return code;
-}
-}

@@ -42,9 +42,6 @@ inline void disarm() {
 int64_t met();      // calls of the plan, since arm
 int64_t refused();  // of them, those that failed
 
-// The seek that comes next lands where the decoded PCM has no match.
-void hide_landing();
-
 }  // namespace fault
 
 #endif

@@ -161,42 +161,6 @@ inline std::vector<int32_t> rises(const std::vector<double> &signal) {
     return flags;
 }
 
-// The peaks that are put back between frames a and b: at most maxn, the strongest first when there
-// are more. Of equal ones the first stands for all.
-inline std::vector<int32_t> between(int32_t a, int32_t b, const std::vector<int32_t> &peaks,
-                                    size_t maxn, const std::vector<double> &env) {
-    const auto height = [&](int32_t peak) { return env[static_cast<size_t>(peak)]; };
-    const auto own = std::lower_bound(peaks.begin(), peaks.end(), a);
-    if (own == peaks.end() || maxn == 0) return {};
-    const auto end = std::max(own + 1, std::lower_bound(own, peaks.end(), b));
-    const std::vector<int32_t> list(own + 1, end);
-    if (list.size() <= maxn) return list;
-    std::vector<int32_t> strongest = list;
-    std::stable_sort(strongest.begin(), strongest.end(),
-                     [&](int32_t x, int32_t y) { return height(x) > height(y); });
-    strongest.resize(maxn);
-    for (int32_t &peak : strongest) {
-        peak = *std::find_if(list.begin(), list.end(),
-                             [&](int32_t x) { return height(x) == height(peak); });
-    }
-    return strongest;
-}
-
-// Ends of the quiet stretches: the last low point of each run of low points less than gap apart.
-inline std::vector<int32_t> valleys(const std::vector<float> &values, float threshold,
-                                    int32_t gap) {
-    std::vector<int32_t> lows, ends;
-    for (size_t i = 0; i < values.size(); ++i) {
-        if (values[i] < threshold) lows.push_back(static_cast<int32_t>(i));
-    }
-    for (size_t k = 0; k < lows.size(); ++k) {
-        const bool last = k + 1 == lows.size();
-        if (last || (lows[k + 1] - lows[k] >= gap && lows[k] != 0)) ends.push_back(lows[k]);
-    }
-    if (ends.size() > 15) ends.resize(15);
-    return ends;
-}
-
 }  // namespace reference
 
 #endif
