@@ -3,7 +3,6 @@ import json
 import os
 import pathlib
 import resource
-import shutil
 import struct
 import subprocess
 import tempfile
@@ -63,10 +62,7 @@ class Case(unittest.TestCase):
     def put(self, name, content=None, source=None):
         path = self.folder / name
         path.parent.mkdir(parents=True, exist_ok=True)
-        if content is None:
-            shutil.copy(source or short_song(), path)
-        else:
-            path.write_bytes(content)
+        path.write_bytes(pathlib.Path(source or short_song()).read_bytes() if content is None else content)
         return path
 
     def put_hours_of_silence(self, name, hours):
@@ -83,8 +79,8 @@ class Case(unittest.TestCase):
         """Runs in the case's folder; arguments may be bytes. Output is bytes."""
         if "input" not in options:
             options["stdin"] = subprocess.DEVNULL
-        done = subprocess.run([*before, TAVO, *arguments], capture_output=True, cwd=self.folder,
-                              timeout=250, **options)
+        done = subprocess.run([*before, TAVO, *arguments], capture_output=True, cwd=self.folder, timeout=250,
+                              **options)
         self.assertEqual(done.returncode, status, (arguments, done.stdout, done.stderr))
         return done
 
@@ -96,8 +92,7 @@ class Case(unittest.TestCase):
 
     def run_json(self, *arguments, status=0, **options):
         """The results, without the time that each took."""
-        results = self.objects(self.run_tavo("--format", "json", *arguments, status=status,
-                                             **options).stdout)
+        results = self.objects(self.run_tavo("--format", "json", *arguments, status=status, **options).stdout)
         for result in results:
             if result["status"] == "ok":
                 self.assertGreaterEqual(result["cpu_ms"], 0)

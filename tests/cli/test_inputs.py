@@ -41,6 +41,10 @@ class Names(Inputs):
         self.assertEqual([r["file"].encode("utf-8", "surrogateescape") for r in rows], ODD_NAMES)
         self.assertEqual(self.found("-0", "-", input=b"\0".join(ODD_NAMES)), ODD_NAMES)
         self.assertEqual(self.found("."), [b"./" + name for name in sorted(ODD_NAMES)])
+        deep = "/".join(["d" * 100] * 7) + "/song.wav"
+        self.put(deep)
+        self.put("-dash.wav")
+        self.assertEqual(self.found("--", "-dash.wav", deep), [b"-dash.wav", deep.encode()])
 
     def test_text_stays_one_line_a_name_and_obeys_no_escapes(self):
         done = self.run_tavo("--mode", "highlight", *ODD_NAMES, b"no\nsuch\x1b\xe9", status=1)
@@ -49,12 +53,6 @@ class Names(Inputs):
         done.stdout.decode("utf-8")
         self.assertEqual(done.stdout.count(b"\n"), 3 * len(ODD_NAMES))
         self.assertIn(rb"line\nbreak.wav", done.stdout)
-
-    def test_a_dash_and_a_long_path(self):
-        self.put("-dash.wav")
-        deep = "/".join(["d" * 100] * 7) + "/song.wav"
-        self.put(deep)
-        self.assertEqual(self.found("--", "-dash.wav", deep), [b"-dash.wav", deep.encode()])
 
 
 class Places(Inputs):
@@ -86,30 +84,24 @@ class Places(Inputs):
             self.assertIn("holds no audio files", result["error"])
 
     def test_lists(self):
-        a, b = b"music/a.wav", b"music/b.txt"
-        deep = b"music/inner/deep/d.wav"
+        a, b, deep = b"music/a.wav", b"music/b.txt", b"music/inner/deep/d.wav"
         self.put("#1.wav")
         self.put("list", a + b"\n")
-        cases = [  # arguments, standard input, what is analysed
-            (["-"], b"music/b.txt\n\nmusic/a.wav\nmusic/inner/deep", [b, a, deep]),  # no last newline
-            (["--files-from", "-"], b"music/b.txt\n\nmusic/a.wav\nmusic/inner/deep\n", [b, a, deep]),
-            (["music/b.txt", "--files-from", "list"], b"", [b, a]),
-            (["-"], b"\xef\xbb\xbf#EXTM3U\r\n#EXTINF:60,Song\r\nmusic/a.wav\r\n\r\n#1.wav\r\n",
-             [a, b"#1.wav"]),
-        ]
-        for arguments, text, expected in cases:
-            with self.subTest(arguments=arguments, text=text):
-                self.assertEqual(self.found(*arguments, input=text), expected)
+        for words, text, expected in (
+                ("-", b"music/b.txt\n\nmusic/a.wav\nmusic/inner/deep", [b, a, deep]),  # no last newline
+                ("--files-from -", b"music/b.txt\nmusic/inner/deep\n", [b, deep]),
+                ("music/b.txt --files-from list", b"", [b, a]),
+                ("-", b"\xef\xbb\xbf#EXTM3U\r\n#EXTINF:60,Song\r\nmusic/a.wav\r\n\r\n#1.wav\r\n", [a, b"#1.wav"])):
+            self.assertEqual(self.found(*words.split(), input=text), expected, text)
 
     def test_what_is_no_list(self):
         sound = (self.folder / "music/a.wav").read_bytes()
-        for arguments, text, said in (
-                (["-"], sound, "sound (WAV), not a list"), (["-0", "-"], sound, "sound (WAV)"),
-                (["--files-from", "music/a.wav"], b"", "name it as FILE"),
-                (["-"], b"music/a.wav\0music/b.txt", "give -0"),
-                (["-"], b"x" * 70000, "more than 4096 bytes"),
-                (["--files-from", "nowhere"], b"", "list of files cannot be read")):
-            (result,) = self.run_json(*arguments, input=text, status=1)
+        for words, text, said in (
+                ("-", sound, "sound (WAV), not a list"), ("-0 -", sound, "sound (WAV)"),
+                ("--files-from music/a.wav", b"", "name it as FILE"),
+                ("-", b"music/a.wav\0music/b.txt", "give -0"), ("-", b"x" * 70000, "more than 4096 bytes"),
+                ("--files-from nowhere", b"", "list of files cannot be read")):
+            (result,) = self.run_json(*words.split(), input=text, status=1)
             self.assertIn(said, result["error"])
         done = self.run_tavo("--format", "json", "-", input=b"")
         self.assertEqual(done.stdout, b"")
@@ -117,15 +109,13 @@ class Places(Inputs):
 
     def test_a_list_is_served_as_it_comes(self):
         """A result is there before the next name is; memory does not grow with the names."""
-        process = subprocess.Popen([TAVO, "--format", "json", "-m", "highlight", "-"],
-                                   cwd=self.folder, stdin=subprocess.PIPE, stdout=subprocess.PIPE,
-                                   stderr=subprocess.DEVNULL)
+        process = subprocess.Popen([TAVO, "--format", "json", "-m", "highlight", "-"], cwd=self.folder,
+                                   stdin=subprocess.PIPE, stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
         self.addCleanup(process.wait)
         self.addCleanup(process.kill)
 
         def answer(names):
-            writer = threading.Thread(target=lambda: (process.stdin.write(names),
-                                                      process.stdin.flush()))
+            writer = threading.Thread(target=lambda: (process.stdin.write(names), process.stdin.flush()))
             writer.start()
             for _ in range(names.count(b"\n")):
                 result = self.objects(process.stdout.readline())[0]
@@ -139,6 +129,4 @@ class Places(Inputs):
         name, after = answer(missing * 40000 + b"music/b.txt\n")
         self.assertEqual(name, "music/b.txt")
         self.assertLess(after - before, 4000)  # KiB; the names alone have 8000
-        process.stdin.close()
-        self.assertEqual((process.stdout.read(), process.wait()), (b"", 1))
-        process.stdout.close()
+        self.assertEqual((process.communicate()[0], process.returncode), (b"", 1))

@@ -3,7 +3,6 @@ import os
 import pathlib
 import re
 import time
-import unittest
 
 from selenium import webdriver
 from selenium.webdriver.chrome.options import Options
@@ -122,10 +121,10 @@ class Report(Case):
         self.show("page.html")
 
     def test_index(self):
-        for i, name in enumerate(("b.wav", "a.wav", "c.wav")):
+        names = ["b.wav", "a.wav", "bad.wav", "c.wav"]
+        for i, name in enumerate(names):
             self.put(name, source=short_song(seed=i))
         self.put("bad.wav", content=b"RIFF" + bytes(60))
-        names = ["b.wav", "a.wav", "bad.wav", "c.wav"]
         results = self.run_json("-j", "2", "--report", "all.html", *names, status=1)
         self.show("all.html")
 
@@ -159,6 +158,3 @@ class Report(Case):
         self.run_tavo("--report", "none/page.html", "a.wav", status=1)
         self.run_tavo("--embed", "a.wav", status=2)
 
-
-if __name__ == "__main__":
-    unittest.main()
