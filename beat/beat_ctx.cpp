@@ -17,7 +17,7 @@ int64_t count_frames(int64_t samples, int32_t frame_size, int32_t hop_size) {
 }
 
 float **alloc_rows(int32_t rows, int32_t columns) {
-    float **matrix = zeroed_items<float *>(rows);
+    auto **matrix = zeroed_items<float *>(rows);
     if (matrix == nullptr) return nullptr;
     for (int32_t i = 0; i < rows; ++i) matrix[i] = zeroed_items<float>(columns);
     return matrix;

@@ -65,7 +65,7 @@ outcome find_tempo(TAVO_ONSET_CTX *onset, const TAVO_BEAT_CTX *beat) {
 
 // Leaves the beats in an array of their exact number; none at all leave it null.
 outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
-    float *room = zeroed_items<float>(candidate_room(beat));
+    auto *room = zeroed_items<float>(candidate_room(beat));
     if (room == nullptr) return out_of_memory;
     const int32_t count = getBeatCandi_MT(beat, onset, room);
     outcome end = going_on;
@@ -104,7 +104,7 @@ void forget_beats(TAVO_ONSET_CTX *onset) {
 int32_t getBeatPosition(TAVO_CTX *ctx) {
     if (ctx == nullptr || ctx->onset == nullptr) return 0;
     forget_beats(ctx->onset);
-    TAVO_BEAT_CTX *beat = zeroed_items<TAVO_BEAT_CTX>(1);
+    auto *beat = zeroed_items<TAVO_BEAT_CTX>(1);
     if (beat == nullptr) return 0;
 
     if (prepare_beat_ctx(ctx, beat) && analyse(ctx, beat) == going_on) {

@@ -84,7 +84,7 @@ int64_t candidate_room(const TAVO_BEAT_CTX *beat) {
 
 int32_t getBeatCandi_MT(TAVO_BEAT_CTX *beat, TAVO_ONSET_CTX *onset, float *out) {
     if (beat->frame_count < 2 || onset->bpm < 1 || onset->bpm > kBeatPerFrame) return 0;
-    double *thr = zeroed_items<double>(beat->frame_count - 1);
+    auto *thr = zeroed_items<double>(beat->frame_count - 1);
     PEAK_LIST peaks = {zeroed_items<int32_t>(peak_room(beat)), 0};
     int32_t total = 0;
     if (thr != nullptr && peaks.frames != nullptr) {

@@ -40,7 +40,8 @@ int32_t blip_length(int32_t sr) {
 
 // A 4 kHz tone that swells for a tenth of the length and fades.
 void make_blip(int32_t sr, int32_t length, float *blip) {
-    const auto tau = static_cast<float>(length / 10);
+    const int32_t tenth = length / 10;
+    const auto tau = static_cast<float>(tenth);
     for (int32_t i = 0; i < length; ++i) {
         const float decay = -static_cast<float>(i) / tau;  // float on purpose
         const double envelope = exp(static_cast<double>(decay)) * i;
@@ -109,7 +110,7 @@ int32_t makeWaveHeader(uint32_t n, FILE *stream) {
 
 void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, float *track) {
     const int32_t length = blip_length(sr);
-    float *blip = zeroed_items<float>(length);
+    auto *blip = zeroed_items<float>(length);
     if (blip == nullptr) return;
     make_blip(sr, length, blip);
     lay_blips(blip, length, beats, count, sr, n, track);
@@ -123,8 +124,8 @@ void write_click_track(const TAVO_CTX *ctx) {
     const int64_t n = analysis_length(ctx);
     const int32_t sr = ctx->ana_rate;
     const int32_t length = blip_length(sr);
-    float *blip = zeroed_items<float>(length);
-    float *track = zeroed_items<float>(n);
+    auto *blip = zeroed_items<float>(length);
+    auto *track = zeroed_items<float>(n);
     FILE *stream = blip != nullptr && track != nullptr ? fopen(fnamedec, "wb") : nullptr;
     if (stream != nullptr) {
         make_blip(sr, length, blip);

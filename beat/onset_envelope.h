@@ -41,8 +41,8 @@ extern "C" {
 void _getOnsetEnvelope(TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size);
 
 // Thread entry of one worker, and its completion handler. The argument is the TAVO_ONSET_WORKER.
-void *_tavo_proc_onsetenv(void *worker);
-void _thd_cleanup(void *worker);
+void *_tavo_proc_onsetenv(void *record);
+void _thd_cleanup(void *record);
 }
 
 // The same from the samples of a view. Meanwhile the calling thread does the work of beside, once,

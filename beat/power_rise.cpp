@@ -248,7 +248,7 @@ int32_t find_power_rises(sample_view view, int64_t n, int64_t **samples) {
     if (blocks.count < 3) return 0;
 
     blocks.db = zeroed_items<double>(blocks.count + kLookAhead);
-    double *sorted = zeroed_items<double>(blocks.count);
+    auto *sorted = zeroed_items<double>(blocks.count);
     *samples = zeroed_items<int64_t>(blocks.count / kRiseApart + 1);
     int32_t count = TAVO_ERR_MEMORY;
     if (blocks.db != nullptr && sorted != nullptr && *samples != nullptr) {

@@ -88,8 +88,8 @@ int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, 
         if (!std::isfinite(x[i])) return 0;
     }
     const int64_t room = nfft > lags ? nfft : lags;
-    double *re = zeroed_items<double>(room);
-    double *im = zeroed_items<double>(room);
+    auto *re = zeroed_items<double>(room);
+    auto *im = zeroed_items<double>(room);
     int32_t period = TAVO_ERR_MEMORY;
     if (re != nullptr && im != nullptr) {
         for (int32_t i = 0; i < count; ++i) re[i] = x[i];

@@ -67,7 +67,7 @@ void slide_window(TAVO_THRES_WORKER *worker, double *win) {
 void run_thres_worker(void *record) {
     auto *worker = static_cast<TAVO_THRES_WORKER *>(record);
     if (worker->first > worker->last || worker->window < 1) return;
-    double *win = zeroed_items<double>(worker->window);
+    auto *win = zeroed_items<double>(worker->window);
     if (win == nullptr) {
         worker->thr = nullptr;
         return;
@@ -160,7 +160,7 @@ int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, double *thr) 
     if (frames < 2 || window < 2) return 0;
     if (feat_mutex_mt == nullptr || feat_cond_mt == nullptr) return TAVO_ERR_MEMORY;
     const auto second = static_cast<int32_t>(1.0f / beat->frame_times[0]);
-    double *scratch = zeroed_items<double>(window > second ? window : second);
+    auto *scratch = zeroed_items<double>(window > second ? window : second);
     if (scratch == nullptr) return TAVO_ERR_MEMORY;
 
     // One or two values short of a full window, the single place in the middle has what there is.

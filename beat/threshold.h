@@ -27,8 +27,8 @@ static_assert(offsetof(TAVO_THRES_WORKER, cond) == 88);
 extern "C" {
 
 // Thread entry of one worker, and its completion handler. The argument is the TAVO_THRES_WORKER.
-void *_tavo_proc_beatcandi(void *worker);
-void _thd_thres_cleanup(void *worker);
+void *_tavo_proc_beatcandi(void *record);
+void _thd_thres_cleanup(void *record);
 }
 
 // Fills thr[F - 1] (zero before) for a window of W frames, on four threads. Returns 0; -2 out of

@@ -158,8 +158,9 @@ int print_forecast(const options &opts, const catalogue &all, size_t sampled) {
     printf("%s: %s, %s analysed in %s\n", shown(opts.forecast).c_str(),
            count_text(static_cast<size_t>(all.files), "file").c_str(),
            std::to_string(sampled).c_str(), count_text(all.strata.size(), "kind").c_str());
-    if (all.missing > 0)
+    if (all.missing > 0) {
         printf("  %lld listed and not there\n", static_cast<long long>(all.missing));
+    }
     printf("a file, with 95 %% intervals\n");
     print_line("processor", cpu, 1.0, "s");
     print_line("read", size, 1e-6, "MB");

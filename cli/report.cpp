@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cinttypes>
 #include <cmath>
 #include <filesystem>
 #include <fstream>
@@ -212,7 +213,7 @@ std::string make_page(record &result, const options &opts, const std::string &ta
 std::string report_page_path(const options &opts, uint64_t index, const std::string &song) {
     if (takes_one_file(opts)) return opts.report;
     std::array<char, 24> number{};
-    snprintf(number.data(), number.size(), "%06llu ", static_cast<unsigned long long>(index + 1));
+    snprintf(number.data(), number.size(), "%06" PRIu64 " ", index + 1);
     return pages_folder(opts) + "/" + fitting_name(number.data() + base_name(song), ".html");
 }
 

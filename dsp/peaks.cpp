@@ -132,7 +132,7 @@ int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_
     if (len > kMaxIndexed) len = kMaxIndexed;
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
-    PEAK_INFO_F *peaks = collect_peaks<PEAK_INFO_F>(x, len, count);
+    auto *peaks = collect_peaks<PEAK_INFO_F>(x, len, count);
     auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
     int32_t written = 0;
     if (peaks != nullptr && marks != nullptr) {
@@ -150,7 +150,7 @@ int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out)
     if (len > kMaxIndexed) len = kMaxIndexed;
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
-    PEAK_INFO *peaks = collect_peaks<PEAK_INFO>(x, len, count);
+    auto *peaks = collect_peaks<PEAK_INFO>(x, len, count);
     auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
     int32_t written = 0;
     if (peaks != nullptr && marks != nullptr) {
@@ -172,7 +172,7 @@ int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_
     if (len > kMaxIndexed) len = kMaxIndexed;
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
-    PEAK_INFO *peaks = collect_peaks<PEAK_INFO>(x, len, count);
+    auto *peaks = collect_peaks<PEAK_INFO>(x, len, count);
     auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
     int32_t taken = -1;
     if (peaks != nullptr && marks != nullptr) {

@@ -41,8 +41,9 @@ int32_t partition(int32_t lo, int32_t hi, double *a) {
     int64_t j = static_cast<int64_t>(hi) + 1;
     for (;;) {
         while (i < j && a[i] <= pivot) ++i;
-        do --j;
-        while (j > lo && a[j] > pivot);
+        do {
+            --j;
+        } while (j > lo && a[j] > pivot);
         if (i >= j) break;
         swap(&a[i], &a[j]);
     }

@@ -4,8 +4,8 @@ set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "finds the highlight, the tempo and the be
 set(CPACK_PACKAGE_DESCRIPTION "\
 The command tavo reads WAV, MP3, AAC, MP4, FLAC and Ogg Vorbis files and says
 where the strongest sustained loud passage starts, how fast the song is, and at
-which times it can be cut on a beat; as text, JSON, CSV or label tracks for
-Audacity. The library libtavo does the same for C programs, with a class for
+which times it can be cut on a beat; as text, JSON, CSV, markers for editors or
+a page that plays. The library libtavo does the same for C programs, with a class for
 Java.")
 set(CPACK_PACKAGE_CONTACT "tavo maintainers <maintainers@tavo.invalid>")
 set(CPACK_RESOURCE_FILE_README ${CMAKE_SOURCE_DIR}/README.md)

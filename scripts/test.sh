@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # scripts/test.sh
-# Sets up, checks the formatting, builds and runs every test, among them the fuzzers' kept inputs, in
-# the release and under the sanitizers. Ends with CTest's summary; fails when any of it does.
+# Sets up, checks the formatting and what .clang-tidy asks for, builds and runs every test, among them
+# the fuzzers' kept inputs, in the release and under the sanitizers. Ends with CTest's summary; fails when any of it does.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 
@@ -16,6 +16,8 @@ for preset in release asan tsan; do
   cmake --preset "$preset" >/dev/null
   cmake --build --preset "$preset"
 done
+echo "== clang-tidy"
+bash scripts/tidy.sh || failed+=("clang-tidy")
 for preset in release asan tsan; do
   echo "== $preset: tests"
   ctest --preset "$preset" --parallel "$(nproc)" ||

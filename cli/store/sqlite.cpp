@@ -65,8 +65,9 @@ std::string run(void *handle, const std::string &sql, const row &values,
         code = sqlite3_step(statement);
         if (code != SQLITE_ROW || !on_row) continue;
         row found;
-        for (int i = 0; i < sqlite3_column_count(statement); ++i)
+        for (int i = 0; i < sqlite3_column_count(statement); ++i) {
             found.push_back(column(statement, i));
+        }
         on_row(found);
     }
     const std::string error = code == SQLITE_DONE ? "" : sqlite3_errmsg(db);

@@ -77,7 +77,7 @@ std::string put_sql() {
 cell cell_of(const json &result, const char *key) {
     const auto found = result.find(key);
     if (found == result.end()) return std::monostate();
-    if (found->is_boolean()) return int64_t{found->get<bool>()};
+    if (found->is_boolean()) return int64_t{found->get<bool>() ? 1 : 0};
     if (found->is_number_integer()) return found->get<int64_t>();
     if (found->is_string()) return found->get<std::string>();
     return found->dump();
