@@ -29,13 +29,6 @@ TEST(Wav, ReadsEveryShapeOfHeader) {
         return support::wav_bytes(pcm, plan);
     };
     const bytes plain = support::wav_bytes(pcm, {});
-    const bytes swapped =
-        joined({part(plain, 0, kFormat), part(plain, kData), part(plain, kFormat, kData)});
-    // The size in 64 bits; one byte of what follows is not part of the data.
-    bytes sizes = {'d', 's', '6', '4', 28};
-    sizes.resize(8 + 28);
-    const bytes data = patched(part(plain, kFormat), kData - kFormat + 4, 0xFFFFFFFF, 4);
-    const bytes wide = joined({part(plain, 0, kFormat), patched(sizes, 16, 120'000, 8), data, {1}});
     const struct {
         const char *name;
         bytes contents;
@@ -50,26 +43,14 @@ TEST(Wav, ReadsEveryShapeOfHeader) {
         {"ones", wav([](wav_spec &s) { s.data_size = wav_data_size::all_ones; }), 2, 30000},
         {"large", wav([](wav_spec &s) { s.data_size = wav_data_size::too_large; }), 2, 30000},
         {"cut", wav([](wav_spec &s) { s.cut_bytes = 5; }), 2, 29998},
-        // Not recognised as WAV, the reader would take them.
-        {"data before format", swapped, 0, 0},
-        {"junk first", wav([](wav_spec &s) { s.junk_first = true; }), 0, 0},
-        {"wide", wide, 0, 0},
     };
     for (const auto &each : shapes) {
         SCOPED_TRACE(each.name);
         const std::string path = save("shape.wav", each.contents);
-        const mtsrc_io io = io_for(path);
-        xwav_info info = {};
-        int32_t word = 0;
-        void *reader = xwavd_create(&io, &info, &word);
-        ASSERT_NE(reader, nullptr);
-        xwavd_delete(reader);
-        if (each.frames == 0) {
-            EXPECT_EQ(info.duration * 44100 / kUnits, 30000);
-            continue;
-        }
-        EXPECT_EQ(static_cast<size_t>(info.channels), each.channels);
-        EXPECT_EQ(static_cast<size_t>(info.duration * 44100 / kUnits), each.frames);
+        const opened file(path);
+        ASSERT_NE(file.source, nullptr);
+        EXPECT_EQ(static_cast<size_t>(file.format.channels), each.channels);
+        EXPECT_EQ(static_cast<size_t>(file.format.duration * 44100 / kUnits), each.frames);
         samples first(each.frames);
         for (size_t i = 0; i < each.frames; ++i) first[i] = pcm[i * each.channels];
         expect_same(read_all(path), first);

@@ -1,4 +1,4 @@
-// RIFF WAVE with 16-bit linear PCM: chunks in any order, lying sizes, files beyond 4 GiB (RF64).
+// RIFF WAVE with 16-bit linear PCM: chunks in any order, lying sizes, files beyond 4 GiB.
 //
 // In: mtsrc_io. Out: whole sample frames of interleaved PCM, the information record.
 #include <algorithm>
@@ -16,7 +16,6 @@ constexpr int32_t kRiffHead = 12;         // bytes: "RIFF", size, "WAVE"
 constexpr int32_t kChunkHead = 8;         // bytes: name, size
 constexpr int32_t kFormatBytes = 16;      // least size of a "fmt " chunk
 constexpr int32_t kExtensibleBytes = 40;  // of an extensible one
-constexpr int32_t kSizesBytes = 16;       // of "ds64" up to the data size
 constexpr uint32_t kUnknownSize = 0xFFFFFFFF;
 constexpr int32_t kMaxChunks = 65536;  // a file that has more is no song
 constexpr int32_t kTagPcm = 1;
@@ -45,7 +44,6 @@ struct wav_head {
     int32_t bits;
     int64_t data;        // offset
     int64_t data_bytes;  // as present in the file
-    int64_t long_bytes;  // data size of "ds64", -1 without one
 };
 
 uint32_t le16(const uint8_t *p) {
@@ -75,11 +73,7 @@ void read_data(wav_head *head, int64_t offset, uint32_t size, int64_t file_size)
     head->has_data = true;
     head->data = offset;
     head->data_bytes = rest;
-    if (size == kUnknownSize && head->long_bytes > 0) {
-        head->data_bytes = std::min(rest, head->long_bytes);
-    } else if (size != 0 && size != kUnknownSize) {
-        head->data_bytes = std::min<int64_t>(rest, size);
-    }
+    if (size != 0 && size != kUnknownSize) head->data_bytes = std::min<int64_t>(rest, size);
 }
 
 // Walks the chunks until both the format and the data are known. False on a read error or when the
@@ -88,10 +82,9 @@ bool read_chunks(io_file *f, wav_head *head) {
     int32_t got = 0;
     const uint8_t *p = io_file_peek(f, 0, kRiffHead, &got);
     if (p == nullptr || got < kRiffHead || memcmp(p + 8, "WAVE", 4) != 0 ||
-        (memcmp(p, "RIFF", 4) != 0 && memcmp(p, "RF64", 4) != 0)) {
+        memcmp(p, "RIFF", 4) != 0) {
         return false;
     }
-    head->long_bytes = -1;
     int64_t at = kRiffHead;
     for (int32_t i = 0; i < kMaxChunks && !(head->has_format && head->has_data); ++i) {
         p = io_file_peek(f, at, kChunkHead + kExtensibleBytes, &got);
@@ -100,10 +93,6 @@ bool read_chunks(io_file *f, wav_head *head) {
         const int64_t body = std::min<int64_t>(got - kChunkHead, size);
         if (memcmp(p, "fmt ", 4) == 0 && body >= kFormatBytes && !head->has_format) {
             read_format(head, p + kChunkHead, body);
-        } else if (memcmp(p, "ds64", 4) == 0 && body >= kSizesBytes) {
-            const uint8_t *bytes = p + kChunkHead + 8;
-            const uint64_t wide = static_cast<uint64_t>(le32(bytes + 4)) << 32 | le32(bytes);
-            head->long_bytes = static_cast<int64_t>(std::min<uint64_t>(wide, INT64_MAX));
         } else if (memcmp(p, "data", 4) == 0 && !head->has_data) {
             read_data(head, at + kChunkHead, size, f->size);
             at = head->data + head->data_bytes + (head->data_bytes & 1);
