@@ -165,7 +165,7 @@ class Faults : public testing::TestWithParam<std::tuple<std::string, int>> {
     }
     const std::string format = std::get<0>(GetParam());
     const int mode = std::get<1>(GetParam());
-    const int64_t count = format == "wav" && EVERY_WAV_PLACE ? INT64_MAX : FAULT_SAMPLE;
+    const int64_t count = format == "wav" && EVERY_PLACE ? INT64_MAX : FAULT_SAMPLE;
 };
 
 TEST_P(Faults, AtEveryPlace) {
@@ -179,9 +179,14 @@ TEST_P(Faults, AtEveryPlace) {
     }
 }
 
+// The thread sanitizer slows the rest down most, and finds no other threads in them.
+std::vector<std::string> formats() {
+    if (!EVERY_PLACE) return {"wav", "mp3"};
+    return {"wav", "m4a", "flac", "mp3", "aac", "ogg"};
+}
+
 INSTANTIATE_TEST_SUITE_P(Jobs, Faults,
-                         testing::Combine(testing::Values("wav", "m4a", "flac", "mp3", "aac",
-                                                          "ogg"),
+                         testing::Combine(testing::ValuesIn(formats()),
                                           testing::Values(kOpenedOnly, 0, 1, 2)));
 
 // A signal interrupts a read: nothing may change.
