@@ -19,36 +19,31 @@ struct analysis {
     TAVO_CTX ctx = {};
     std::vector<double> ana;
 
-    explicit analysis(std::vector<double> samples) : ana(std::move(samples)) {
+    explicit analysis(std::vector<double> samples, int32_t size = 512, int32_t hop = 256)
+        : ana(std::move(samples)) {
         fnamedec = "";
         ctx.ana = ana.data();
         ctx.ana_len = static_cast<int64_t>(ana.size());
         ctx.ana_rate = kAnalysisRate;
         ctx.state = kStateRunning;
         ctx.onset = static_cast<TAVO_ONSET_CTX *>(calloc(1, sizeof(TAVO_ONSET_CTX)));
-        ctx.onset->frame_size = kFrameSize;
-        ctx.onset->hop_size = kHopSize;
+        ctx.onset->frame_size = size;
+        ctx.onset->hop_size = hop;
         ctx.onset->bpm = -7;  // not touched yet
     }
     analysis(const analysis &) = delete;
     ~analysis() { clearOnsetCtx(ctx.onset); }
-
-    std::vector<float> beats() const {
-        return {ctx.onset->beat_times, ctx.onset->beat_times + ctx.onset->beat_count};
-    }
 };
 
-// The working context of a signal, with the lock and condition.
+// The working context of a silent signal of exactly that many frames, with the lock and condition.
 struct working_context {
     analysis of;
     TAVO_BEAT_CTX beat = {};
 
-    explicit working_context(std::vector<double> samples) : of(std::move(samples)) {
+    explicit working_context(int64_t frames, int32_t size = 512, int32_t hop = 256)
+        : of(std::vector<double>(static_cast<size_t>(hop * (frames - 1) + size)), size, hop) {
         __beat_init(&of.ctx, &beat);
     }
-    // A silent signal of exactly that many frames, to be given an envelope by hand.
-    explicit working_context(int64_t frames)
-        : working_context(std::vector<double>(static_cast<size_t>(256 * (frames - 1) + 512))) {}
     ~working_context() { __tavo_deinit(&beat); }
 };
 
@@ -71,8 +66,13 @@ inline std::vector<double> wild_samples(size_t n, int highest, std::mt19937 *ran
     return samples;
 }
 
-inline bool same_bits(const std::vector<double> &a, const std::vector<double> &b) {
-    return a.size() == b.size() && memcmp(a.data(), b.data(), a.size() * sizeof(double)) == 0;
+// The same bits, or both no numbers.
+inline bool same_bits(const double *a, const std::vector<double> &b) {
+    for (size_t i = 0; i < b.size(); ++i) {
+        if (std::isnan(b[i]) ? !std::isnan(a[i]) : memcmp(&a[i], &b[i], sizeof b[i]) != 0)
+            return false;
+    }
+    return true;
 }
 
 #endif

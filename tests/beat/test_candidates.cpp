@@ -28,10 +28,10 @@ struct envelope : working_context {
     frames place(int32_t max_beats = 0) {
         of.ctx.onset->max_beats = max_beats;
         std::vector<float> out(static_cast<size_t>(candidate_room(&beat)));
-        const int32_t count = getBeatCandi_MT(&beat, of.ctx.onset, out.data());
+        out.resize(static_cast<size_t>(getBeatCandi_MT(&beat, of.ctx.onset, out.data())));
         frames found;
-        for (size_t k = 0; k < static_cast<size_t>(count); ++k) {
-            const double hops = static_cast<double>(out[k]) / 1000.0 / kHop;
+        for (const float ms : out) {
+            const double hops = static_cast<double>(ms) / 1000.0 / kHop;
             EXPECT_NEAR(hops, std::round(hops), 1e-3);
             found.push_back(std::lround(hops) - 2);
         }
@@ -42,7 +42,7 @@ struct envelope : working_context {
 }  // namespace
 
 // 120 BPM: beats at least 43 frames apart, the larger first. -1 and 0 mean no limit.
-TEST(Candidates, PeaksAndTheirDistance) {
+TEST(Candidates, PeaksAndTheirLimit) {
     envelope env(1000, 120);
     for (const int64_t frame : {100, 143, 200, 242, 400}) env.peak(frame, 5.0);
     env.peak(200, 6.0);
@@ -50,20 +50,39 @@ TEST(Candidates, PeaksAndTheirDistance) {
     EXPECT_EQ(env.place(), (frames{100, 143, 200, 400}));
     EXPECT_EQ(env.place(-1).size(), 4u);
     EXPECT_EQ(env.place(1), frames{200});
+    for (const double value : {double{NAN}, double{INFINITY}, 1.0}) {
+        std::fill(env.beat.onset_env, env.beat.onset_env + 999, value);
+        EXPECT_EQ(env.place(), frames{}) << value;
+    }
+    EXPECT_EQ(envelope(1, 90).place(), frames{});
+    EXPECT_EQ(envelope(500, 0).place(), frames{});
 }
 
-// 96 BPM: two periods, 1.25 s. From 95 BPM down at least 3 s: five periods, 3.158 s.
-TEST(Candidates, SlowBeatsLieFartherApart) {
-    for (const auto &c : {std::pair{96, 53}, {95, 135}}) {
-        for (const int near : {0, 1}) {
-            envelope env(1000, c.first);
-            env.peak(300, 5.0);
-            env.peak(300 + c.second - near, 6.0);
-            EXPECT_EQ(env.place().size(), near == 0 ? 2u : 1u) << c.first << " BPM";
+// 96 BPM: beats two periods apart, 1.25 s. From 95 BPM down at least 3 s: five periods, 3.158 s.
+// A peak that the threshold keeps out comes back in gaps longer than 3 s, 129.2 frames at 120 BPM;
+// at 40 BPM 6 s are enough, 258.4 frames, though three spans are 9 s.
+TEST(Candidates, DistancesThatCount) {
+    const struct {
+        int32_t bpm;
+        int64_t distance, middle;
+        size_t beats;
+    } cases[] = {{96, 52, 0, 1},    {96, 53, 0, 2},    {95, 134, 0, 1},   {95, 135, 0, 2},
+                 {120, 129, 50, 2}, {120, 130, 50, 3}, {40, 258, 129, 2}, {40, 259, 129, 3}};
+    for (const auto &c : cases) {
+        envelope env(1200, c.bpm);
+        env.peak(300, 20.0);
+        env.peak(300 + c.distance, 21.0);
+        if (c.middle > 0) {
+            env.kept_out(300 + c.middle, 2.0);
+            // Enough plateaus for the slow tempo's longer window (third, eighth largest).
+            std::fill_n(env.beat.onset_env + 320 + c.middle, 9, 10.0);
         }
+        EXPECT_EQ(env.place().size(), c.beats) << c.bpm << " BPM, " << c.distance << " frames";
     }
 }
 
+// At 120 BPM both rises take the peak at 300, so the beat appears twice, and 330 lies too close to
+// it. The last peak serves no rise: an ordinary one then takes the place that needs no threshold.
 TEST(Candidates, ARiseNeedsNoThreshold) {
     envelope env(1000, 120);
     env.peak(100, 20.0);
@@ -72,18 +91,14 @@ TEST(Candidates, ARiseNeedsNoThreshold) {
     env.peak(400, 21.0);
     EXPECT_EQ(env.place(), (frames{100, 330, 400}));  // a gap of 300 frames, over 3 spans
     env.rises({290, 310});
-    // Both rises take the peak at 300, so the beat appears twice, and 330 lies too close to it.
     EXPECT_EQ(env.place(), (frames{100, 300, 300, 400}));
-}
 
-// The last peak serves no rise; an ordinary one then takes the place that needs no threshold.
-TEST(Candidates, ARiseThatFindsNoPeak) {
-    envelope env(400, 120);
-    env.kept_out(200, 9.0);
-    env.peak(300, 5.0);
-    EXPECT_EQ(env.place(), frames{300});
-    env.rises({350});
-    EXPECT_EQ(env.place(), (frames{200, 300}));
+    envelope last(400, 120);
+    last.kept_out(200, 9.0);
+    last.peak(300, 5.0);
+    EXPECT_EQ(last.place(), frames{300});
+    last.rises({350});
+    EXPECT_EQ(last.place(), (frames{200, 300}));
 }
 
 TEST(Candidates, GapsAreFilled) {
@@ -95,25 +110,6 @@ TEST(Candidates, GapsAreFilled) {
     env.kept_out(700, 2.5);  // a sixth: the weakest stays out
     EXPECT_EQ(env.place(), (frames{100, 300, 400, 500, 600, 700, 800}));
     EXPECT_EQ(env.place(1), frames{800});  // no gap
-}
-
-// 120 BPM: longer than 3 s, 129.2 frames. 40 BPM: 6 s, 258.4 frames, though three spans are 9 s.
-TEST(Candidates, GapsThatAreLongEnough) {
-    const struct {
-        int32_t bpm;
-        int64_t gap;
-        size_t beats;
-    } cases[] = {{120, 129, 2}, {120, 130, 3}, {40, 258, 2}, {40, 259, 3}};
-    for (const auto &c : cases) {
-        envelope env(1200, c.bpm);
-        const int64_t middle = c.bpm == 40 ? 429 : 350;
-        env.peak(300, 20.0);
-        // Enough plateaus for the slow tempo's longer window (third, eighth largest).
-        env.kept_out(middle, 2.0);
-        std::fill(env.beat.onset_env + middle + 20, env.beat.onset_env + middle + 29, 10.0);
-        env.peak(300 + c.gap, 21.0);
-        EXPECT_EQ(env.place().size(), c.beats) << c.bpm << " BPM, gap " << c.gap;
-    }
 }
 
 // Five fit each gap. Nine gaps have 45, not more than 45, so a tenth is filled and no eleventh.
@@ -130,32 +126,11 @@ TEST(Candidates, FiftyAreAddedAtMost) {
     EXPECT_EQ(env.place(3).size(), 3u + 10u);
 }
 
-TEST(Candidates, NothingToPlace) {
-    for (const double value : {double{NAN}, double{INFINITY}, 1.0}) {
-        envelope env(500, 90);
-        std::fill(env.beat.onset_env, env.beat.onset_env + 499, value);
-        EXPECT_EQ(env.place(), frames{}) << value;
-    }
-    EXPECT_EQ(envelope(1, 90).place(), frames{});
-    EXPECT_EQ(envelope(500, 0).place(), frames{});
-}
-
-TEST(Candidates, PeaksBetweenTwoBeats) {
-    const double heights[] = {0, 0, 5, 0, 1, 0, 7, 0, 3, 0, 9, 0, 3, 0, 2, 0, 8, 0, 4, 0, 6};
-    const int32_t peaks[] = {2, 4, 6, 8, 10, 12, 14, 16, 18, 20};
-    const struct {
-        int32_t a, b, most;
-        std::vector<int32_t> expected;
-    } cases[] = {
-        {1, 13, 5, {4, 6, 8, 10, 12}},    // all of five, though rounding made both ends smaller
-        {2, 99, 5, {10, 16, 6, 20, 18}},  // the strongest of nine first
-        {6, 16, 3, {10, 8, 8}},           // of 3, 9, 3, 2: equal heights give the first one twice
-        {16, 99, 5, {18, 20}},            // no later peak
-        {21, 99, 5, {}},
-    };
-    for (const auto &c : cases) {
-        int32_t dst[5];
-        const int32_t found = bringMoreBeat(c.a, c.b, dst, peaks, 10, c.most, heights);
-        EXPECT_EQ(std::vector<int32_t>(dst, dst + found), c.expected) << c.a << " to " << c.b;
-    }
+// Of 3, 9, 3 and 2, the two equal ones give the first of them twice.
+TEST(Candidates, EqualPeaksBetweenTwoBeats) {
+    const double heights[] = {0, 1, 0, 3, 0, 9, 0, 3, 0, 2};
+    const int32_t peaks[] = {1, 3, 5, 7, 9};
+    int32_t dst[3];
+    ASSERT_EQ(bringMoreBeat(0, 99, dst, peaks, 5, 3, heights), 3);
+    EXPECT_EQ(std::vector<int32_t>(dst, dst + 3), (std::vector<int32_t>{5, 3, 3}));
 }

@@ -13,16 +13,6 @@ namespace {
 
 using indexes = std::vector<int32_t>;
 
-// Loud everywhere but at the low points; with mean 0.5 and deviation 0.25 the threshold is 0.25.
-indexes valleys(const indexes &lows, float hop_s = 2.0f) {
-    std::vector<float> values(120, 0.75f);
-    for (const int32_t low : lows) values[static_cast<size_t>(low)] = 0.125f;
-    indexes out(15, -99);
-    const int32_t count = tavo_find_valley(values.data(), 120, out.data(), 0.5f, 0.25f, hop_s);
-    EXPECT_EQ(std::count(out.begin(), out.end(), -99), 15 - count);
-    return {out.begin(), out.begin() + count};
-}
-
 // Curves of points (2 s each) and a largest value of 1: the normalised values are these. From 90 s
 // on, edges count from point 9 on and up to 25 points before the end; below, from 0 and up to 10.
 // Pairs of how many points have which value.
@@ -59,19 +49,6 @@ uint32_t region(const song &of, int32_t chosen, int32_t len_pts, indexes found,
 }
 
 }  // namespace
-
-TEST(Valleys, EndsOfTheQuietStretches) {
-    EXPECT_EQ(valleys({}), indexes{});
-    EXPECT_EQ(valleys({0, 1, 5, 6, 12}), (indexes{1, 6, 12}));
-    EXPECT_EQ(valleys({0, 10}), (indexes{10}));  // the opening is no valley
-    EXPECT_EQ(valleys({0}), (indexes{0}));       // unless it is all there is
-    EXPECT_EQ(valleys({4, 6, 9}), (indexes{6, 9}));
-    EXPECT_EQ(valleys({4, 6, 9}, 1.0f), (indexes{9}));  // the gap is then 7 points
-    EXPECT_EQ(valleys({4, 10, 16}, 0.0f), (indexes{16}));
-    indexes lows;
-    for (int32_t k = 1; k <= 20; ++k) lows.push_back(5 * k);
-    EXPECT_EQ(valleys(lows), indexes(lows.begin(), lows.begin() + 15));
-}
 
 // Mean above 0.5: below 0.75 - 1.5 x 0.25 = 0.375. Mean 0.5 exactly is not above: below 0.375 as
 // well, not 0.3125.
@@ -113,6 +90,13 @@ TEST(Search, Edges) {
         // the last of them: at 23, 3 after the edge at 20, or at 24.
         {"20 0.5 1 1 1 0.9 1 0.3 1 0.1 1 0.4 5 0.5 2 0.85 28 0.5", 120, 60000},
         {"20 0.5 1 1 1 0.9 1 0.5 1 0.3 1 0.1 1 0.4 4 0.5 2 0.85 28 0.5", 120, 40000},
+        // Three points are too short, too. Of 60 values, 34 are quiet, 37 at most 0.85, 45 at most
+        // 0.9: the 60th percentile is 0.85, so the largest step, to 0.85 at 10, leads nowhere, and
+        // the next one, to 0.9 at 31, does.
+        {"9 0.5 1 0.1 3 0.85 2 0.5 3 1 2 0.5 3 1 2 0.5 3 1 2 0.5 1 0.25 3 0.9 2 0.5 3 1 2 0.5 3 1 "
+         "2 "
+         "0.5 3 0.9 2 0.5 2 0.9 7 0.5",
+         80, 62000},
         {"30 1 30 0.5", 120, 0},  // no rising edge
         {"60 0", 120, 0},
     };
