@@ -44,6 +44,11 @@ TEST(Tempo, SinglePeriods) {
     std::vector<double> x(2584);
     x[100] = x[112] = 1.0;
     EXPECT_EQ(bpm_of(x, 4096), 215);
+    TAVO_BEAT_CTX beat = {};
+    beat.onset_env = x.data();
+    beat.frame_count = 2584;
+    beat.hop_seconds = kHop;
+    EXPECT_EQ(estimate_tempo(&beat), 90);  // above 200
     x[112] = 0.0;
     x[120] = 1.0;
     x[300] = x[359] = 2.0;
