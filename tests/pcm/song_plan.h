@@ -17,10 +17,12 @@
 
 #include "media_source/mtsrc_ctx.h"
 #include "pcm/decode.h"
+#include "pcm/resample.h"
 #include "tests/support/scripted_codec.h"
 
 using byte_run = std::vector<uint8_t>;
 using sample_run = std::vector<int16_t>;
+using signal_run = std::vector<double>;
 
 // Bytes among which no 200 in a row occur twice.
 inline byte_run noise(int64_t bytes, uint32_t seed) {
@@ -30,7 +32,8 @@ inline byte_run noise(int64_t bytes, uint32_t seed) {
     return run;
 }
 
-inline byte_run slice(const byte_run &run, int64_t first, int64_t end) {
+template <typename T>
+std::vector<T> slice(const std::vector<T> &run, int64_t first, int64_t end) {
     return {run.begin() + first, run.begin() + end};
 }
 
@@ -45,11 +48,28 @@ inline sample_run samples_of(const byte_run &bytes) {
     return samples;
 }
 
+// The n values of a conversion's output, which is freed.
+inline signal_run taken(double *out, int64_t n) {
+    for (int64_t i = n; i < n + 8; ++i) EXPECT_EQ(out[i], 0.0);  // 64 cleared bytes follow
+    signal_run result(out, out + n);
+    free(out);
+    return result;
+}
+
+// The analysis signal of count samples at a rate.
+inline signal_run converted(const int16_t *samples, size_t count, int32_t rate) {
+    int64_t n = -1;
+    double *out = nullptr;
+    const auto bytes = static_cast<int64_t>(count * 2);
+    EXPECT_EQ(dorn_resampler_run(samples, bytes, rate, kAnalysisRate, &n, &out), 0);
+    EXPECT_TRUE(ext_mutex_resample == nullptr && ext_cond_resample == nullptr);
+    return taken(out, n);
+}
+
 // What a source plays once it is planned, and what it saw.
 struct player {
     byte_run stream = {};
     int64_t at = 0;           // next byte
-    int64_t warm = 0;         // bytes still to be falsified, as after a seek into mid-stream
     int64_t fail_at = -1;     // byte from which on reads fail
     int empty_replies = 0;    // reads that bring nothing before the others do
     int32_t code = 0;         // of a read within the stream
@@ -69,9 +89,8 @@ inline int32_t play(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
     const bool empty = self->empty_replies > 0 && self->empty_replies-- > 0;
     const int64_t left = static_cast<int64_t>(self->stream.size()) - self->at;
     const int64_t bytes = empty ? 0 : std::clamp<int64_t>(left, 0, want);
-    auto *out = static_cast<uint8_t *>(frame->data);
-    std::copy_n(self->stream.begin() + (bytes > 0 ? self->at : 0), bytes, out);
-    for (int64_t i = 0; i < bytes && self->warm > 0; ++i, --self->warm) out[i] ^= 0x55;
+    std::copy_n(self->stream.begin() + (bytes > 0 ? self->at : 0), bytes,
+                static_cast<uint8_t *>(frame->data));
     self->at += bytes;
     frame->size = static_cast<int32_t>(bytes);
     return bytes < want && !empty ? 1 : self->code;
@@ -127,12 +146,6 @@ class song_plan : public testing::Test {
         const auto *first = reinterpret_cast<const uint8_t *>(ctx.pcm);
         return {first, first + bytes};
     }
-    // As the caller of construct_decbuf has to.
-    void drop_buffers() {
-        for (int32_t i = 0; i < ctx.seg_count; ++i) free(ctx.seg[i].buf);
-        free(ctx.pcm);
-    }
-
     std::string path = testing::TempDir() + "tavo_pcm_" + std::to_string(getpid());
     std::string head = "fLaC and some more";  // what recognition reads
     scripted::script script;

@@ -1,7 +1,7 @@
+#include <array>
 #include <memory>
 
 #include "pcm/from_highlight.h"
-#include "pcm/resample.h"
 #include "pcm/song.h"
 #include "tests/pcm/song_plan.h"
 
@@ -29,13 +29,8 @@ class from_highlight : public song_plan {
         EXPECT_EQ(ctx.pcm, nullptr);
         EXPECT_EQ(hl.hl_pos, hl_pos);
         const sample_run samples = samples_of(bytes);
-        int64_t n = 0;
-        double *out = nullptr;
-        dorn_resampler_run(samples.data(), static_cast<int64_t>(bytes.size()), kRate, kAnalysisRate,
-                           &n, &out);
-        ASSERT_EQ(ctx.ana_len, n);
-        EXPECT_EQ(memcmp(ctx.ana, out, static_cast<size_t>(n) * sizeof *out), 0);
-        free(out);
+        EXPECT_EQ(taken(std::exchange(ctx.ana, nullptr), ctx.ana_len),
+                  converted(samples.data(), samples.size(), kRate));
     }
 
     const byte_run stream = noise(kBytes, 1);
@@ -47,6 +42,10 @@ TEST_F(from_highlight, no_seek_in_the_first_second) {
     expect_from(1000, stream, 0);
     EXPECT_TRUE(sources[0].seeks.empty());
     decode(stream);
+    // The PCM is cut without decoding, and only the source of the record is needed.
+    for (int i = 0; i < 4; ++i) ctx.seg[i].got = 0;
+    ctx.seg[0].fmt = {};
+    ctx.seg[0].duration = 0;
     expect_from(1001, slice(stream, 16'016, kBytes), 1001);
     EXPECT_EQ(sources[0].seeks, positions{10'010'000});
     decode(stream);
@@ -98,24 +97,12 @@ TEST_F(from_highlight, where_the_landing_point_is_found) {
     }
 }
 
-TEST_F(from_highlight, pcm_of_the_caller_is_cut_without_decoding) {
-    decode(stream);
-    for (int i = 0; i < 4; ++i) ctx.seg[i].got = 0;
-    ctx.seg[0].fmt = {};  // only the source of the record is needed
-    ctx.seg[0].duration = 0;
-    expect_from(2500, slice(stream, 40'000, kBytes), 2500);
-    EXPECT_EQ(sources[0].seeks.size(), 1U);
-}
-
-TEST_F(from_highlight, job_leaves_no_buffers) {
+TEST_F(from_highlight, what_is_left) {
     decode(stream);
     sources[0].land = 0;  // out of range
     EXPECT_EQ(start_song_at(&ctx, 15'000), 0);
     EXPECT_EQ(ctx.ana_len, kBytes / 4 / 2 * kAnalysisRate / kRate);
     for (int i = 0; i < 4; ++i) EXPECT_EQ(ctx.seg[i].buf, nullptr);
-}
-
-TEST_F(from_highlight, nothing_left_cannot_be_planned) {
     decode(stream);
     sources[0].report = kDuration;
     EXPECT_EQ(tavo_get_from_here(&ctx, 15'000), -2);
@@ -130,23 +117,18 @@ TEST_F(from_highlight, comparison_reads_its_record_alone) {
     seg->fmt.sample_rate = kRate;
     seg->src = ctx.seg[0].src;
     seg->start = 10'000'000;
-    const struct {
-        int64_t duration, bytes;  // bytes of the buffer, which a duration of 0 does not tell
-        int64_t landed;
-        bool found;
-    } cases[] = {
-        {41'250'000, 50'000, 50'000 - kBlock - 200, true},
-        {41'250'000, 50'000, 50'000 - kBlock - 199, false},
-        {0, kBytes, 60'000, true},
-    };
-    for (const auto &each : cases) {
-        SCOPED_TRACE(each.landed);
-        seg->duration = each.duration;
-        sources[0].at = each.landed;
-        const sample_run pcm = samples_of(slice(stream, 0, each.bytes));
+    // The buffer's bytes, which a duration of 0 does not tell.
+    for (const auto &[duration, bytes, landed] :
+         {std::array<int64_t, 3>{41'250'000, 50'000, 50'000 - kBlock - 200},
+          {41'250'000, 50'000, 50'000 - kBlock - 199},
+          {0, kBytes, 60'000}}) {
+        const bool found = landed != 50'000 - kBlock - 199;
+        seg->duration = duration;
+        sources[0].at = landed;
+        const sample_run pcm = samples_of(slice(stream, 0, bytes));
         int64_t off = 43'000;
-        EXPECT_EQ(_compare_decoded(seg.get(), pcm.data(), &off), each.found ? 0 : -1);
-        EXPECT_EQ(off, each.found ? each.landed : 43'000);
+        EXPECT_EQ(_compare_decoded(seg.get(), pcm.data(), &off), found ? 0 : -1);
+        EXPECT_EQ(off, found ? landed : 43'000);
     }
 }
 
