@@ -69,13 +69,13 @@ inline signal_run converted(const int16_t *samples, size_t count, int32_t rate) 
 // What a source plays once it is planned, and what it saw.
 struct player {
     byte_run stream = {};
-    int64_t at = 0;           // next byte
-    int64_t fail_at = -1;     // byte from which on reads fail
-    int empty_replies = 0;    // reads that bring nothing before the others do
-    int32_t code = 0;         // of a read within the stream
-    int64_t land = -1;        // byte where the next seek lands, whatever it is asked
-    int64_t report = -1;      // units that the next seek reports, whatever it is asked
-    bool seek_fails = false;  // the next one, without a report
+    int64_t at = 0;               // next byte
+    int64_t fail_at = INT64_MAX;  // byte from which on reads fail
+    int empty_replies = 0;        // reads that bring nothing before the others do
+    int32_t code = 0;             // of a read within the stream
+    int64_t land = -1;            // byte where the next seek lands, whatever it is asked
+    int64_t report = -1;          // units that the next seek reports, whatever it is asked
+    bool seek_fails = false;      // the next one, without a report
     std::vector<int64_t> seeks = {};
     int32_t most_wanted = 0;
 };
@@ -85,11 +85,11 @@ inline int32_t play(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
     player *self = players.at(src);
     self->most_wanted = std::max(self->most_wanted, want);
     frame->size = want;
-    if (self->fail_at >= 0 && self->at + want > self->fail_at) return TAVO_ERR_READ;
+    if (self->at + want > self->fail_at) return TAVO_ERR_READ;
     const bool empty = self->empty_replies > 0 && self->empty_replies-- > 0;
-    const int64_t left = static_cast<int64_t>(self->stream.size()) - self->at;
-    const int64_t bytes = empty ? 0 : std::clamp<int64_t>(left, 0, want);
-    std::copy_n(self->stream.begin() + (bytes > 0 ? self->at : 0), bytes,
+    const auto end = static_cast<int64_t>(self->stream.size());
+    const int64_t bytes = empty ? 0 : std::clamp<int64_t>(end - self->at, 0, want);
+    std::copy_n(self->stream.data() + std::min(self->at, end), bytes,
                 static_cast<uint8_t *>(frame->data));
     self->at += bytes;
     frame->size = static_cast<int32_t>(bytes);

@@ -47,6 +47,7 @@ TEST_F(decode_plan, what_is_refused_and_how_it_is_cut) {
             code = construct_decbuf(&ctx, start);
         }
         EXPECT_EQ(code, each.code);
+        EXPECT_EQ(ctx.seg_count, code == -2 && each.segments == 0 ? 4 : each.segments);
         EXPECT_EQ(ctx.pcm_bytes, each.pcm_bytes);
         EXPECT_EQ(pcm(each.pcm_bytes), byte_run(static_cast<size_t>(each.pcm_bytes), 0));
         EXPECT_EQ(ctx.pcm != nullptr, code == 0);

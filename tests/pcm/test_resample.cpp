@@ -6,34 +6,8 @@
 #include "pcm/resample.h"
 #include "pcm/song.h"
 #include "tests/pcm/song_plan.h"
+#include "tests/support/fault_layer.h"
 #include "tests/support/reference.h"
-
-namespace {
-
-// Counts down to the failing request; 0: none fails. Set on the thread under test.
-thread_local int failing_allocation = 0;
-
-bool allocation_fails() {
-    return failing_allocation > 0 && --failing_allocation == 0;
-}
-
-}  // namespace
-
-extern "C" {
-void *__real_malloc(size_t size);
-void *__real_calloc(size_t count, size_t size);
-void *__real_realloc(void *block, size_t size);
-
-void *__wrap_malloc(size_t size) {
-    return allocation_fails() ? nullptr : __real_malloc(size);
-}
-void *__wrap_calloc(size_t count, size_t size) {
-    return allocation_fails() ? nullptr : __real_calloc(count, size);
-}
-void *__wrap_realloc(void *block, size_t size) {
-    return allocation_fails() ? nullptr : __real_realloc(block, size);
-}
-}
 
 namespace {
 
@@ -248,14 +222,14 @@ TEST(resample_run, each_allocation_fails_in_turn) {
           {44100, true, ".eess."},
           {22050, true, "eeess."}}) {
         std::string found;
-        for (int nth = 1; nth <= 6; ++nth) {
+        for (int64_t nth = 0; nth < 6; ++nth) {
             TAVO_CTX ctx = with_pcm(8000, rate);
             std::fill_n(ctx.pcm, 4000, 1000);
-            failing_allocation = nth;
+            fault::arm({fault::kMemory, nth});
             const int32_t code = job ? convert_song(&ctx, 0)
                                      : dorn_resampler_run(ctx.pcm, 8000, rate, kAnalysisRate,
                                                           &ctx.ana_len, &ctx.ana);
-            failing_allocation = 0;
+            fault::disarm();
             found += code == -2 ? 'e' : ctx.ana[100] == 0.0 ? 's' : '.';
             EXPECT_EQ(ctx.ana == nullptr, code != 0);
             EXPECT_EQ(ctx.ana_len, code != 0 ? 0 : 4000LL * kAnalysisRate / rate);
