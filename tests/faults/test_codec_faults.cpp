@@ -28,7 +28,8 @@ namespace {
 
 constexpr unsigned kLongest = 30;  // seconds of one job
 constexpr long kMostMib = 256;
-constexpr int kCalls = 2;  // of a value, tried by the quick tier
+constexpr int64_t kFrame = 8192;  // samples
+constexpr int kCalls = 2;         // of a value, tried by the quick tier
 constexpr int kStep = 17;  // of what there is to try at those, the quick tier takes one in so many
 
 // What each value is replaced by.
@@ -96,15 +97,32 @@ bool is_report(const job::result &result, int32_t mode) {
     return result.status == (mode == TAVO_MODE_HIGHLIGHT ? 0 : -1);
 }
 
+// PCM cut into frames, each starting at its time. A little longer than there is: the end is
+// reached.
+scripted::script script_of(const support::song &song) {
+    scripted::script made;
+    made.sample_rate = song.plan.rate;
+    made.channels = song.plan.channels;
+    const auto samples = static_cast<int64_t>(song.pcm.size());
+    const int64_t second = made.sample_rate * made.channels;
+    made.duration = samples * kUnitsPerSecond / second + kUnitsPerSecond / 2;
+    for (int64_t at = 0; at < samples; at += kFrame) {
+        const int64_t end = std::min(samples, at + kFrame);
+        made.frames.push_back(
+            {{song.pcm.begin() + at, song.pcm.begin() + end}, at * kUnitsPerSecond / second});
+    }
+    return made;
+}
+
 char current[256];  // the run that hangs
 
 class CodecFaults : public testing::TestWithParam<std::string> {
  protected:
     // One job on the script with the fault. True when all is as promised.
     bool run(int32_t mode) {
-        scripted::reset();
-        scripted::use(script);
-        scripted::tamper(hand_back);
+        scripted::all = {};
+        scripted::all.use(script);
+        scripted::all.tamper = hand_back;
         now.calls.clear();
         now.struck = false;
         int32_t err = 99;
@@ -117,8 +135,8 @@ class CodecFaults : public testing::TestWithParam<std::string> {
             good = good && is_report(last, mode) && tavo_deinit(ctx) == TAVO_OK;
         }
         good = good && job::last.calls == (ctx != nullptr ? 1 : 0);
-        return good && scripted::live_objects() == 0 && scripted::tag_buffers_left() == 0 &&
-               scripted::faults().empty();
+        return good && scripted::all.alive.empty() && scripted::tags_are_empty() &&
+               scripted::all.faults.empty();
     }
 
     void strike(const place &where, int64_t call, int32_t mode) {
@@ -154,16 +172,10 @@ TEST_P(CodecFaults, AreSurvived) {
     plan.seconds = 15.5;
     plan.loud_at = 6.0;
     plan.tail_at = 15.0;
-    script = scripted::song(support::make_song(plan).pcm, plan.channels, plan.rate, 4096);
-    script.tags = true;
-    script.duration += 5'000'000;  // a little more than there is: the end is reached
-    byte_run head = wav_file();
-    if (GetParam() != "wav") {
-        const source_row &row = source_row_of(GetParam());
-        head = row.file;
-        if (row.tag != 0) script.codec = row.tag;
-    }
-    ASSERT_TRUE(support::write_bytes(path, head));
+    script = script_of(support::make_song(plan));
+    const source_row &row = row_of(GetParam());
+    if (row.tag != 0) script.codec = row.tag;
+    std::ofstream(path) << row.file;
     signal(SIGALRM, [](int) {
         (void)!write(STDERR_FILENO, current, strlen(current));
         _exit(3);
@@ -180,7 +192,6 @@ TEST_P(CodecFaults, AreSurvived) {
     }
     alarm(0);
     EXPECT_GT(struck, 50);
-    scripted::reset();  // the last job's tag records
     unlink(path.c_str());
     rusage used = {};
     getrusage(RUSAGE_SELF, &used);

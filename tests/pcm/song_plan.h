@@ -109,7 +109,7 @@ inline int32_t move_player(mtsrc_ctx *src, int64_t position, int64_t *reached) {
 
 class song_plan : public testing::Test {
  protected:
-    song_plan() { scripted::reset(); }
+    song_plan() { scripted::all = {}; }
     ~song_plan() override {
         release();
         remove(path.c_str());
@@ -120,8 +120,8 @@ class song_plan : public testing::Test {
         ctx = {};
         players.clear();
         EXPECT_TRUE(ext_mutex_mt == nullptr && ext_cond_mt == nullptr);
-        EXPECT_EQ(scripted::live_objects(), 0);
-        EXPECT_TRUE(scripted::faults().empty());
+        EXPECT_TRUE(scripted::all.alive.empty());
+        EXPECT_TRUE(scripted::all.faults.empty());
     }
     // The code of tavo_decode_init. The sources play stream from where setup moved them.
     int32_t plan(int64_t duration, int32_t rate, const byte_run &stream = {}) {
@@ -130,7 +130,7 @@ class song_plan : public testing::Test {
         script.channels = 1;
         script.duration = duration;
         script.sample_rate = rate;
-        scripted::use(script);
+        scripted::all.use(script);
         const TAVO_PARAM param = {path.c_str(), 0};
         const int32_t code = tavo_decode_init(&ctx, &param);
         for (int32_t i = 0; code == 0 && i < ctx.seg_count; ++i) {

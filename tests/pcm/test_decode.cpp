@@ -39,7 +39,7 @@ TEST_F(decode_plan, what_is_refused_and_how_it_is_cut) {
         int32_t code = plan(each.duration, each.rate);
         const int32_t records = ctx.seg_count;
         const int64_t start = each.start == kSetup ? 0 : each.start;
-        EXPECT_EQ(scripted::live_objects(), records);  // the probe is closed
+        EXPECT_EQ(scripted::all.alive.size(), static_cast<size_t>(records));  // the probe is closed
         if (each.start != kSetup) {
             ASSERT_EQ(code, 0);
             for (int32_t i = 0; i < records; ++i) free(ctx.seg[i].buf);
@@ -73,20 +73,20 @@ TEST_F(decode_plan, what_is_refused_and_how_it_is_cut) {
 
 TEST_F(decode_plan, sources_that_cannot_be_opened_and_all_that_are_closed) {
     for (size_t good = 0; good <= 4; ++good) {
-        std::vector<int32_t> answers(good, 0);
+        std::deque<int32_t> &answers = scripted::all.answers["xflac_init"];
+        answers.assign(good, 0);
         answers.push_back(1);
-        scripted::answer("xflac_init", answers);
         // The probe, whatever its own code; a segment's own code.
         EXPECT_EQ(plan(kTenSeconds, kRate), good == 0 ? -4 : -255) << good;
         EXPECT_EQ(ctx.seg, nullptr);
     }
-    scripted::answer("xflac_init", {});
+    scripted::all.answers.clear();
     for (const bool by_duration : {true, false}) {  // all four are closed at the release
         ASSERT_EQ(plan(kTenSeconds, kRate), 0);
         if (by_duration) ctx.seg_count = 1;  // a later plan of one segment
         if (!by_duration) ctx.duration = 0;
         tavo_decode_deinit(&ctx);
-        EXPECT_EQ(scripted::live_objects(), 0);
+        EXPECT_TRUE(scripted::all.alive.empty());
         EXPECT_TRUE(ctx.seg == nullptr && ctx.pcm == nullptr);
     }
     path += "/no such file";

@@ -2,88 +2,362 @@
 
 #include <algorithm>
 #include <cstdlib>
-
-#include "tests/support/scripted_world.h"
+#include <cstring>
+#include <mutex>
 
 namespace scripted {
+namespace {
 
-void reset() {
-    const lock held(guard);
-    for (wexa_tags *tags : all.tags) free(tags);
-    for (object *left : all.alive) delete left;
-    all = {};
+constexpr size_t kCallsKept = 1000;
+constexpr int kMostRepeats = 1000;  // while tampering: an end that is hidden for ever is a failure
+
+std::mutex guard;
+
+constexpr char kMagic[8] = "SCFRAME";
+
+// A frame in its compressed form: enough to find it again.
+struct label {
+    char magic[8];  // kMagic
+    const frame *of;
+};
+
+template <typename record>
+void note(const record *handed) {
+    all.calls.back().addresses.push_back(handed);
+    all.calls.back().records.push_back(handed ? bytes_of(*handed) : "");
 }
 
-void tamper(tampering with) {
-    const lock held(guard);
-    all.tamper = with;
+// Notes a call with the records handed over. What follows runs until the end of the call.
+template <typename... record>
+std::unique_lock<std::mutex> called(const char *name, const record *...records) {
+    std::unique_lock<std::mutex> held(guard);
+    if (all.tamper || all.calls.size() == kCallsKept) all.calls.clear();
+    all.calls.emplace_back();
+    all.calls.back().name = name;
+    (note(records), ...);
+    return held;
 }
 
-void use(const script &plan) {
-    const lock held(guard);
-    all.scripts.push_back(plan);
+// Returns -1.
+int32_t fault(const std::string &reason) {
+    all.faults.push_back(all.calls.back().name + ": " + reason);
+    return -1;
 }
 
-void answer(const std::string &name, const std::vector<int32_t> &results) {
-    const lock held(guard);
-    all.answers[name].assign(results.begin(), results.end());
+// What the call hands back for a value of that name.
+template <typename number>
+number told(const char *value, number truth) {
+    if (!all.tamper) return truth;
+    return static_cast<number>(all.tamper(all.calls.back().name, value, truth));
 }
 
-std::vector<call> calls_of(const std::string &name) {
-    const lock held(guard);
+// The call's result: the next answer given for its function, else the other value.
+int32_t take(int32_t otherwise) {
+    std::deque<int32_t> &answers = all.answers[all.calls.back().name];
+    if (!answers.empty()) {
+        otherwise = answers.front();
+        answers.pop_front();
+    }
+    return told("result", otherwise);
+}
+
+std::string kind_of_call() {
+    const std::string &name = all.calls.back().name;
+    return name.substr(0, name.find('_'));
+}
+
+// The object behind the handle when it is alive and of that kind; else null and a fault.
+object *checked(const void *handle, const std::string &kind = kind_of_call()) {
+    for (object &each : all.alive) {
+        if (&each == handle && each.kind == kind) return &each;
+    }
+    fault("no such object");
+    return nullptr;
+}
+
+object *make(const script *plan = &all.scripts.back(), const object *demux = nullptr) {
+    if (take(0) != 0) return nullptr;
+    all.alive.push_back({{}, kind_of_call(), plan, demux});
+    return &all.alive.back();
+}
+
+void destroy(const void *handle) {
+    if (!checked(handle)) return;
+    for (const object &each : all.alive) {
+        if (each.demux == handle) fault("its stream is still open");
+    }
+    all.alive.remove_if([handle](const object &each) { return &each == handle; });
+}
+
+int64_t start_of(const script &plan, size_t index) {
+    const int64_t start = index < plan.frames.size() ? plan.frames[index].start : -1;
+    return start < 0 ? static_cast<int64_t>(index) : start;
+}
+
+int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_t *first,
+                   int64_t *second) {
+    all.calls.back().number = size;
+    object *of = checked(handle);
+    if (!of) return -1;
+    if (of->kind == "xflacfd" && of->state[kFlacReaderFlag]-- != 1) fault("the flag is not set");
+    const script &plan = *of->plan;
+    const size_t index = of->place;
+    const bool behind = index == plan.frames.size();
+    const frame &now = behind ? plan.last : plan.frames[of->place++];
+    const int32_t result = take(now.result);
+    if (result != 0) return result;
+    if (all.tamper && behind && ++of->repeats > kMostRepeats) return -1;
+    label mark = {{}, &now};
+    memcpy(mark.magic, kMagic, sizeof kMagic);
+    const bool wav = of->kind == "xwavd";
+    const void *from = wav ? static_cast<const void *>(now.pcm.data()) : &mark;
+    const size_t length = wav ? now.pcm.size() * 2 : sizeof mark;
+    if (size < 0 || length > static_cast<size_t>(size)) return fault("the buffer is too short");
+    if (length > 0) memcpy(buf, from, length);
+    *bytes = told("bytes", now.read_bytes.value_or(static_cast<int32_t>(length)));
+    *first = told("first", start_of(plan, index));
+    *second = 0;
+    return 0;
+}
+
+int32_t move(const void *handle, int64_t position, int64_t *reached, int32_t flags) {
+    all.calls.back().number = flags;
+    object *of = checked(handle);
+    if (!of) return -1;
+    const int32_t failure = take(0);
+    const script &plan = *of->plan;
+    if (of->seeks < plan.seeks.size()) {
+        const seek &answer = plan.seeks[of->seeks++];
+        if (reached && answer.reached) *reached = *answer.reached;
+        return failure ? failure : answer.result;
+    }
+    if (failure) return failure;
+    const int64_t wanted = of->kind == "xwavd" ? position * 10'000'000 : position;
+    of->place = 0;
+    for (size_t i = 0; i < plan.frames.size(); ++i) {
+        if (start_of(plan, i) <= wanted) of->place = i;
+    }
+    *reached = told("reached", start_of(plan, of->place));
+    return 0;
+}
+
+int32_t decode(const void *handle, const wexa_frame *compressed, wexa_output *output,
+               wexa_status *status) {
+    const auto *bytes = static_cast<const char *>(compressed->data);
+    all.calls.back().records.emplace_back(bytes, compressed->bytes);
+    if (!checked(handle)) return -1;
+    label mark = {};
+    if (compressed->bytes >= static_cast<int32_t>(sizeof mark)) memcpy(&mark, bytes, sizeof mark);
+    status->produced = 0;
+    if (memcmp(mark.magic, kMagic, sizeof kMagic) != 0) {  // the set-up data, or a frame cut short
+        return take(output->data ? -1 : 0);
+    }
+    const frame &now = *mark.of;
+    const int32_t result = take(now.decode);
+    if (result != 0) return result;
+    status->produced = told("produced", now.produced);
+    output->bytes = told("bytes", now.bytes.value_or(static_cast<int32_t>(now.pcm.size() * 2)));
+    if (!now.pcm.empty()) memcpy(output->data, now.pcm.data(), now.pcm.size() * 2);
+    return 0;
+}
+
+// Where the record's buffers hang.
+std::vector<void **> buffers_of(wexa_tags *tags) {
+    std::vector<void **> places = {&tags->last};
+    for (wexa_tag_text &text : tags->text) places.push_back(&text.data);
+    for (wexa_tag_entry &entry : tags->entry) {
+        places.insert(places.end(), {&entry.first, &entry.second});
+    }
+    return places;
+}
+
+template <typename info>
+void *create_file(info *to) {
+    to->duration = told("duration", all.scripts.back().duration);
+    to->tags = &all.tags.emplace_back();
+    for (void **place : buffers_of(to->tags)) *place = malloc(24);
+    return make();
+}
+
+template <typename info>
+void *create_container(info *to, int32_t *count) {
+    const std::vector<int32_t> &kinds = all.scripts.back().kinds;
+    *count =
+        told("count", all.scripts.back().kind_count.value_or(static_cast<int32_t>(kinds.size())));
+    for (size_t i = 0; i < kinds.size() && i < std::size(to->kind); ++i) {
+        to->kind[i] = told("kind", kinds[i]);
+    }
+    return create_file(to);
+}
+
+// A stream's record, of whatever type.
+template <typename info>
+void tell_rate(info *to) {
+    to->sample_rate = told("rate", all.scripts.back().sample_rate);
+}
+template <typename info>
+void tell_rate_and_channels(info *to) {
+    tell_rate(to);
+    to->channels = told("channels", all.scripts.back().channels);
+}
+
+}  // namespace
+
+std::vector<call> calls_of(const std::string &part) {
     std::vector<call> found;
     for (const call &each : all.calls) {
-        if (each.name == name) found.push_back(each);
+        if (each.name.find(part) != std::string::npos) found.push_back(each);
     }
     return found;
 }
 
-std::vector<std::string> call_names() {
-    const lock held(guard);
-    std::vector<std::string> names;
-    for (const call &each : all.calls) names.push_back(each.name);
+std::string call_names() {
+    std::string names;
+    for (const call &each : all.calls) names += each.name + " ";
     return names;
 }
 
-void forget_calls() {
-    const lock held(guard);
-    all.calls.clear();
-}
-
-int live_objects() {
-    const lock held(guard);
-    return static_cast<int>(all.alive.size());
-}
-
-int tag_buffers_left() {
-    const lock held(guard);
-    int count = 0;
-    for (wexa_tags *tags : all.tags) {
-        for (void **place : buffers_of(tags)) count += *place != nullptr;
+bool tags_are_empty() {
+    for (wexa_tags &tags : all.tags) {
+        for (void **place : buffers_of(&tags)) {
+            if (*place) return false;
+        }
     }
-    return count;
-}
-
-std::vector<std::string> faults() {
-    const lock held(guard);
-    return all.faults;
-}
-
-script song(const std::vector<int16_t> &interleaved, int32_t channels, int32_t sample_rate,
-            int32_t frame_samples) {
-    script made;
-    made.sample_rate = sample_rate;
-    made.channels = channels;
-    const auto total = static_cast<int64_t>(interleaved.size()) / channels;
-    made.duration = total * 10'000'000 / sample_rate;
-    for (int64_t at = 0; at < total; at += frame_samples) {
-        const int64_t end = std::min(total, at + frame_samples);
-        frame cut;
-        cut.pcm.assign(interleaved.begin() + at * channels, interleaved.begin() + end * channels);
-        cut.start = at * 10'000'000 / sample_rate;
-        made.frames.push_back(cut);
-    }
-    return made;
+    return true;
 }
 
 }  // namespace scripted
+
+using namespace scripted;
+
+// The functions that have one shape come from macros.
+#define SCRIPTED_READ(function)                                                             \
+    int32_t function(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first, \
+                     int64_t *second) {                                                     \
+        const auto held = called(__func__);                                                 \
+        return read_frame(reader, buf, size, bytes, first, second);                         \
+    }
+#define SCRIPTED_SEEK_WITH_FLAGS(function)                                                     \
+    int32_t function(void *reader, const int64_t *position, int64_t *reached, int32_t flags) { \
+        const auto held = called(__func__, position, reached);                                 \
+        return move(reader, *position, reached, flags);                                        \
+    }
+#define SCRIPTED_REMOVAL(function)          \
+    void function(void *handle) {           \
+        const auto held = called(__func__); \
+        destroy(handle);                    \
+    }
+#define SCRIPTED_READER(reader, info_record, tell_stream)                                 \
+    void *reader##_create(const mtsrc_io *io, int64_t *word, info_record *info, void *) { \
+        const auto held = called(__func__, io, word, info);                               \
+        tell_stream(info);                                                                \
+        return create_file(info);                                                         \
+    }                                                                                     \
+    SCRIPTED_READ(reader##_get_frm)                                                       \
+    int32_t reader##_seek(void *of, const int64_t *position, int64_t *reached) {          \
+        const auto held = called(__func__, position, reached);                            \
+        return move(of, *position, reached, 0);                                           \
+    }                                                                                     \
+    SCRIPTED_REMOVAL(reader##_delete)
+#define SCRIPTED_CONTAINER(container, word_type, info_record, count)                           \
+    void *container##_create(const mtsrc_io *io, word_type *word, info_record *info, void *) { \
+        const auto held = called(__func__, io, word, info);                                    \
+        return create_container(info, &info->count);                                           \
+    }                                                                                          \
+    SCRIPTED_READ(container##s_get_frm)                                                        \
+    SCRIPTED_SEEK_WITH_FLAGS(container##s_seek)                                                \
+    SCRIPTED_REMOVAL(container##s_close)                                                       \
+    SCRIPTED_REMOVAL(container##_delete)                                                       \
+    void *container##s_open(void *demux, int32_t index, void *) {                              \
+        const auto held = called(__func__);                                                    \
+        all.calls.back().number = index;                                                       \
+        const object *of = checked(demux, #container);                                         \
+        return of ? make(of->plan, of) : nullptr;                                              \
+    }
+#define SCRIPTED_DECODER(library, decoder, config_record)                                \
+    int32_t library##_init(void) {                                                       \
+        const auto held = called(__func__);                                              \
+        return take(0);                                                                  \
+    }                                                                                    \
+    void library##_deinit(void) {                                                        \
+        called(__func__);                                                                \
+    }                                                                                    \
+    void *decoder##_create(const config_record *config, void *) {                        \
+        const auto held = called(__func__, config);                                      \
+        return make();                                                                   \
+    }                                                                                    \
+    int32_t decoder##_decode(void *handle, const wexa_frame *frame, wexa_output *output, \
+                             wexa_status *status) {                                      \
+        const auto held = called(__func__, frame, output, status);                       \
+        return decode(handle, frame, output, status);                                    \
+    }                                                                                    \
+    void decoder##_reset(void *handle) {                                                 \
+        const auto held = called(__func__);                                              \
+        checked(handle);                                                                 \
+    }                                                                                    \
+    SCRIPTED_REMOVAL(decoder##_delete)
+
+extern "C" {
+
+SCRIPTED_DECODER(xaac, xaacd, xaac_config)
+SCRIPTED_DECODER(xflac, xflacd, wexa_config)
+SCRIPTED_DECODER(xmp123, xmp123d, wexa_config)
+SCRIPTED_DECODER(xvorbis, xvorbisd, wexa_config)
+SCRIPTED_READER(xaacfd, xaac_info, tell_rate_and_channels)
+SCRIPTED_READER(xflacfd, xflac_info, tell_rate)
+SCRIPTED_READER(xmp123fd, xmp123_info, tell_rate_and_channels)
+SCRIPTED_CONTAINER(xmp4fd, int32_t, xmp4_info, track_count)
+SCRIPTED_CONTAINER(xoggd, int64_t, xogg_info, stream_count)
+SCRIPTED_READ(xwavd_get_frm)
+SCRIPTED_SEEK_WITH_FLAGS(xwavd_seek)
+SCRIPTED_REMOVAL(xwavd_delete)
+
+// The record is filled also when the answer is a failure.
+void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t *word) {
+    const auto held = called(__func__, io, word, info);
+    tell_rate_and_channels(info);
+    info->codec = told("codec", all.scripts.back().codec.value_or(kWexaPcm));
+    info->bits = told("bits", all.scripts.back().bits);
+    info->duration = told("duration", all.scripts.back().duration);
+    return make();
+}
+
+int32_t xmp4fds_get_info_aud(void *stream, xmp4_track *track) {
+    const auto held = called(__func__, track);
+    checked(stream);
+    tell_rate_and_channels(track);
+    track->format_tag = told("codec", all.scripts.back().codec.value_or(kWexaTagAac));
+    return take(0);
+}
+
+int32_t xoggds_get_info_aud(void *stream, xogg_stream *info) {
+    const auto held = called(__func__, info);
+    checked(stream);
+    tell_rate(info);
+    info->codec = told("codec", all.scripts.back().codec.value_or(323));
+    return take(0);
+}
+
+int32_t xaacd_info(void *decoder, const wexa_frame *frame, xaac_stream_info *info) {
+    const auto held = called(__func__, info, frame);
+    checked(decoder);
+    info->word_0 = 1;
+    tell_rate(info);
+    return take(0);
+}
+
+int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
+    const auto held = called(__func__);
+    checked(stream);
+    const int32_t result = take(0);
+    if (result != 0) return result;
+    const std::string &setup = all.scripts.back().setup;
+    int32_t reported = all.scripts.back().setup_length.value_or(static_cast<int32_t>(setup.size()));
+    if (buf) {  // *length says how much it holds
+        reported = std::clamp(*length, 0, static_cast<int32_t>(setup.size()));
+        memcpy(buf, setup.data(), static_cast<size_t>(reported));
+    }
+    *length = told("length", reported);
+    return 0;
+}
+}

@@ -3,11 +3,14 @@
 //
 // A script describes one file: what its information records say and the frames that every reader
 // of it hands out, each with the PCM that its decoding gives. All readers play the script from its
-// start, each at its own place. Any thread may call; one lock guards everything.
+// start, each at its own place. Any thread may call; a test looks at all while none does.
 #ifndef TAVO_TESTS_SUPPORT_SCRIPTED_CODEC_H
 #define TAVO_TESTS_SUPPORT_SCRIPTED_CODEC_H
 
 #include <cstdint>
+#include <deque>
+#include <list>
+#include <map>
 #include <optional>
 #include <string>
 #include <vector>
@@ -41,11 +44,10 @@ struct script {
     int64_t duration = 100'000'000;
     std::vector<int32_t> kinds = {kWexaKindAudio};  // MP4 tracks, Ogg streams
     std::optional<int32_t> kind_count = {};         // reported in place of kinds.size()
-    std::vector<frame> frames = {};  // after the last one: end of stream, again and again
-    int64_t blanks = 0;  // empty frames that each reader hands out first, their calls not recorded
+    std::vector<frame> frames = {};
+    frame last = {{}, -1, kWexaEndOfStream};   // read again and again behind the frames
     std::vector<seek> seeks = {};              // the first answers, for each reader anew
-    bool tags = false;                         // give a tag record with all 42 buffers allocated
-    std::vector<uint8_t> setup = {1, 2, 3};    // Vorbis set-up data
+    std::string setup = "123";                 // Vorbis set-up data
     std::optional<int32_t> setup_length = {};  // reported in place of setup.size()
 };
 
@@ -56,10 +58,8 @@ struct script {
 //   decode: frame, output, status, then the compressed bytes; xaacd_info: information, frame
 struct call {
     std::string name;
-    // get_frm: size; seek: flags; xmp4fds_open, xoggds_open: index; xoggds_get_format: bytes that
-    // the buffer has
-    int32_t number = 0;
-    std::vector<std::vector<uint8_t>> records = {};
+    int32_t number = 0;  // get_frm: size; seek: flags; xmp4fds_open, xoggds_open: index
+    std::vector<std::string> records = {};
     std::vector<const void *> addresses = {};  // of the same records
 };
 
@@ -71,30 +71,41 @@ struct call {
 // the file. Runs under the lock.
 using tampering = int64_t (*)(const std::string &function, const std::string &value, int64_t truth);
 
-// From now on until the next reset; of the calls, only the last is kept meanwhile.
-void tamper(tampering with);
+// What a handle points to. state comes first: the FLAC source sets a flag in its reader's before
+// every read, and the read clears it.
+struct object {
+    uint8_t state[4096] = {};
+    std::string kind = {};  // "xaacfd" of "xaacfd_create"
+    const script *plan = nullptr;
+    const object *demux = nullptr;  // of a demuxer's stream
+    size_t place = 0;               // next frame
+    size_t seeks = 0;               // answers given
+    int repeats = 0;                // of the script's last frame
+};
 
-// Forgets scripts, calls and answers. To be called before each case, with no object alive.
-void reset();
+struct world {
+    std::deque<script> scripts = {script()};  // readers play the one that was last when they came
+    // The next call of the function gives the first result (a function that creates gives null for
+    // any but 0), the next again the one after.
+    std::map<std::string, std::deque<int32_t>> answers = {};
+    std::vector<call> calls = {};          // the latest; while tampering, the last
+    std::list<object> alive = {};          // created, not deleted
+    std::deque<wexa_tags> tags = {};       // given out with all their buffers allocated
+    std::vector<std::string> faults = {};  // wrong objects, double deletions, short buffers
+    tampering tamper = nullptr;
 
-// The script of readers created from now on.
-void use(const script &what);
+    void use(const script &plan) { scripts.push_back(plan); }
+};
+inline world all;  // to be made anew, all = {}, before each case, with no object alive
 
-// The next call of the function gives this result (a function that creates gives null for any but
-// 0), the next again the one after.
-void answer(const std::string &name, const std::vector<int32_t> &results);
+template <typename record>
+std::string bytes_of(const record &from) {
+    return {reinterpret_cast<const char *>(&from), sizeof from};
+}
 
-std::vector<call> calls_of(const std::string &name);
-std::vector<std::string> call_names();
-void forget_calls();
-
-int live_objects();                 // created, not deleted
-int tag_buffers_left();             // pointers not null in the tag records given out
-std::vector<std::string> faults();  // wrong objects, double deletions, short buffers, flags unset
-
-// A script of PCM cut into frames of frame_samples (per channel), each starting at its time.
-script song(const std::vector<int16_t> &interleaved, int32_t channels, int32_t sample_rate,
-            int32_t frame_samples);
+std::vector<call> calls_of(const std::string &part);  // with this in their names
+std::string call_names();                             // each followed by a space
+bool tags_are_empty();  // all buffers of the tag records given out are freed
 
 }  // namespace scripted
 
