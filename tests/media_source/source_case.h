@@ -107,10 +107,8 @@ struct SourceTest : testing::Test {
     // Opens a file of these frames; its calls are forgotten.
     void open_frames(const source_row &row, const std::vector<scripted::frame> &frames,
                      int32_t channels = 2, int32_t rate = 44100) {
-        scripted::script plan;
+        scripted::script plan = {rate, channels};
         plan.frames = frames;
-        plan.channels = channels;
-        plan.sample_rate = rate;
         ASSERT_EQ(open_row(row, plan), 0);
         scripted::all.calls.clear();
     }
