@@ -6,11 +6,9 @@
 
 #include <algorithm>
 #include <climits>
-#include <cmath>
 #include <csignal>
 #include <cstring>
 #include <map>
-#include <set>
 
 #include "tests/media_source/source_case.h"
 #include "tests/support/job_harness.h"
@@ -30,34 +28,25 @@ constexpr unsigned kLongest = 30;  // seconds of one job
 constexpr long kMostMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
 constexpr int kCalls = 2;         // of a value, tried by the quick tier
-constexpr int kStep = 17;  // of what there is to try at those, the quick tier takes one in so many
+constexpr int kStep = 31;  // of what there is to try at those, the quick tier takes one in so many
 
-// What each value is replaced by.
-const std::vector<int64_t> &answers_for(const std::string &value) {
+// What each value is replaced by: anything, and what is close to a limit of its own.
+std::vector<int64_t> answers_for(const std::string &value) {
     static const std::map<std::string, std::vector<int64_t>> all = {
-        {"result", {-1, 1, 2, 0, INT32_MAX, INT32_MIN}},
-        {"bytes",
-         {-1, 0, 1, 3, 16'384, 16'385, 131'071, 1'048'576, 1'048'577, INT32_MAX, INT32_MIN}},
-        {"first", {-1, 0, 1, INT64_MAX, INT64_MIN}},
-        {"reached",
-         {-1, 0, 1, 9'999'999, 159'999'999, 160'000'000, INT32_MAX, 1LL << 40, INT64_MAX,
-          -10'000'000, INT64_MIN}},
-        {"produced", {-1, 0, INT32_MIN}},
-        {"rate", {-1, 0, 1, 7999, 8001, 11'025, 48'001, 192'001, INT32_MAX, INT32_MIN}},
-        {"channels", {-1, 0, 1, 3, 255, 65'536, INT32_MAX, INT32_MIN}},
-        {"bits", {-1, 0, 8, 15, 24, INT32_MAX, INT32_MIN}},
-        {"codec", {-1, 0, 300, 305, 306, 323, kWexaTagAac, kWexaTagMpegLayer3, INT32_MAX}},
-        {"count", {-1, 0, 2, 17, 65, INT32_MAX, INT32_MIN}},
-        {"kind", {-1, 0, 2, INT32_MAX, INT32_MIN}},
-        {"length", {-1, 0, 1, 2, 4, 1 << 20, INT32_MAX, INT32_MIN}},
+        {"bytes", {16'384, 16'385, 131'071, 1'048'576, 1'048'577}},
+        {"reached", {9'999'999, 159'999'999, 160'000'000, -10'000'000}},
+        {"rate", {7999, 8001, 11'025, 48'001, 192'001}},
+        {"bits", {15, 24}},
+        {"codec", {300, 305, 306, 323, kWexaTagAac, kWexaTagMpegLayer3}},
+        {"count", {17, 65}},
         {"duration",
-         {-1, 0, 1, 9'999'999, 10'000'000, 10'000'001, 50'000'000, 50'000'001, INT32_MAX, 1LL << 40,
-          INT64_MAX / 16'000, INT64_MAX, INT64_MIN}},
-    };
-    static const std::vector<int64_t> none;
-    const auto found = all.find(value);
-    EXPECT_NE(found, all.end()) << value;
-    return found == all.end() ? none : found->second;
+         {9'999'999, 10'000'000, 10'000'001, 50'000'000, 50'000'001, INT64_MAX / 16'000}}};
+    std::vector<int64_t> answers = {-1,        0,         1,         2,         3,
+                                    255,       1 << 20,   INT32_MAX, INT32_MIN, 1LL << 40,
+                                    INT64_MAX, INT64_MIN, 65'536};
+    const auto own = all.find(value);
+    if (own != all.end()) answers.insert(answers.end(), own->second.begin(), own->second.end());
+    return answers;
 }
 
 using place = std::pair<std::string, std::string>;  // function and value
@@ -80,21 +69,6 @@ int64_t hand_back(const std::string &function, const std::string &value, int64_t
     if (!wrong) return truth;
     now.struck = now.struck || now.answer != truth;
     return now.answer;
-}
-
-bool is_beat_list(const job::result &result) {
-    for (size_t i = 0; i < result.beats.size(); ++i) {
-        if (!std::isfinite(result.beats[i])) return false;
-        if (i > 0 && result.beats[i] < result.beats[i - 1]) return false;
-    }
-    return result.beat_count > 0 && !result.null_beats;
-}
-
-// What a report must be like, whatever the codec library said.
-bool is_report(const job::result &result, int32_t mode) {
-    if (result.status == 0 && mode != TAVO_MODE_HIGHLIGHT) return is_beat_list(result);
-    if (result.beat_count != 0 || !result.null_beats) return false;
-    return result.status == (mode == TAVO_MODE_HIGHLIGHT ? 0 : -1);
 }
 
 // PCM cut into frames, each starting at its time. A little longer than there is: the end is
@@ -132,7 +106,7 @@ class CodecFaults : public testing::TestWithParam<std::string> {
         if (ctx != nullptr) {
             good = good && tavo_analyze(ctx, 0, 0, 0) == TAVO_OK;
             last = job::wait();
-            good = good && is_report(last, mode) && tavo_deinit(ctx) == TAVO_OK;
+            good = good && !job::flaw_of(last, mode) && tavo_deinit(ctx) == TAVO_OK;
         }
         good = good && job::last.calls == (ctx != nullptr ? 1 : 0);
         return good && scripted::all.alive.empty() && scripted::tags_are_empty() &&

@@ -88,16 +88,12 @@ outcome run(const std::string &path, int mode, const plan &by) {
 
 // Null when the report is as the mode and its own status say.
 const char *flaw_of(const job::result &found, int mode, double song_ms) {
-    const bool beats = found.status == 0 && mode != TAVO_MODE_HIGHLIGHT;
-    if (found.calls != 1) return "callbacks";
+    if (const char *flaw = job::flaw_of(found, mode)) return flaw;
     if (found.hl_pos < 0 || found.hl_pos > song_ms) return "highlight";
-    if (found.status != 0 && (found.status != -1 || mode == TAVO_MODE_HIGHLIGHT)) return "status";
-    if (beats != (found.beat_count > 0) || beats == found.null_beats) return "beats";
     const auto &list = found.beats;
-    const bool ordered = std::is_sorted(list.begin(), list.end());
     const bool inside = list.empty() || (list.front() >= static_cast<float>(found.hl_pos) &&
                                          list.back() <= song_ms);
-    return ordered && inside ? nullptr : "times of the beats";
+    return inside ? nullptr : "beats outside the song";
 }
 
 const char *flaw_of(const outcome &found, int mode, const group &kind, const plan &by,

@@ -2,6 +2,8 @@
 #ifndef TAVO_TESTS_SUPPORT_JOB_HARNESS_H
 #define TAVO_TESTS_SUPPORT_JOB_HARNESS_H
 
+#include <algorithm>
+#include <cmath>
 #include <condition_variable>
 #include <mutex>
 #include <string>
@@ -47,6 +49,18 @@ inline result wait() {
     std::unique_lock<std::mutex> guard(lock);
     changed.wait(guard, [] { return last.calls > 0; });
     return last;
+}
+
+// Null when the report is as the mode and its own status say.
+inline const char *flaw_of(const result &found, int mode) {
+    const auto &list = found.beats;
+    const bool beats = found.status == 0 && mode != TAVO_MODE_HIGHLIGHT;
+    const auto finite = [](float ms) { return std::isfinite(ms); };
+    if (found.calls != 1) return "callbacks";
+    if (found.status != 0 && (found.status != -1 || mode == TAVO_MODE_HIGHLIGHT)) return "status";
+    if (beats != (found.beat_count > 0) || beats == found.null_beats) return "beats";
+    if (!std::is_sorted(list.begin(), list.end())) return "order of the beats";
+    return std::all_of(list.begin(), list.end(), finite) ? nullptr : "times of the beats";
 }
 
 inline TAVO_CTX *create(const std::string &path, int32_t mode, int32_t *err = nullptr) {

@@ -13,12 +13,10 @@ constexpr int kMostRepeats = 1000;  // while tampering: an end that is hidden fo
 
 std::mutex guard;
 
-constexpr char kMagic[8] = "SCFRAME";
-
 // A frame in its compressed form: enough to find it again.
 struct label {
-    char magic[8];  // kMagic
-    const frame *of;
+    char magic[8] = "SCFRAME";
+    const frame *of = nullptr;
 };
 
 template <typename record>
@@ -32,8 +30,7 @@ template <typename... record>
 std::unique_lock<std::mutex> called(const char *name, const record *...records) {
     std::unique_lock<std::mutex> held(guard);
     if (all.tamper || all.calls.size() == kCallsKept) all.calls.clear();
-    all.calls.emplace_back();
-    all.calls.back().name = name;
+    all.calls.push_back({name});
     (note(records), ...);
     return held;
 }
@@ -107,8 +104,8 @@ int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_
     const int32_t result = take(now.result);
     if (result != 0) return result;
     if (all.tamper && behind && ++of->repeats > kMostRepeats) return -1;
-    label mark = {{}, &now};
-    memcpy(mark.magic, kMagic, sizeof kMagic);
+    label mark;
+    mark.of = &now;
     const bool wav = of->kind == "xwavd";
     const void *from = wav ? static_cast<const void *>(now.pcm.data()) : &mark;
     const size_t length = wav ? now.pcm.size() * 2 : sizeof mark;
@@ -146,10 +143,11 @@ int32_t decode(const void *handle, const wexa_frame *compressed, wexa_output *ou
     const auto *bytes = static_cast<const char *>(compressed->data);
     all.calls.back().records.emplace_back(bytes, compressed->bytes);
     if (!checked(handle)) return -1;
-    label mark = {};
+    label mark = {"", nullptr};
     if (compressed->bytes >= static_cast<int32_t>(sizeof mark)) memcpy(&mark, bytes, sizeof mark);
     status->produced = 0;
-    if (memcmp(mark.magic, kMagic, sizeof kMagic) != 0) {  // the set-up data, or a frame cut short
+    if (memcmp(mark.magic, label().magic, sizeof mark.magic) !=
+        0) {  // the set-up data, or a frame cut short
         return take(output->data ? -1 : 0);
     }
     const frame &now = *mark.of;
@@ -161,21 +159,16 @@ int32_t decode(const void *handle, const wexa_frame *compressed, wexa_output *ou
     return 0;
 }
 
-// Where the record's buffers hang.
-std::vector<void **> buffers_of(wexa_tags *tags) {
-    std::vector<void **> places = {&tags->last};
-    for (wexa_tag_text &text : tags->text) places.push_back(&text.data);
-    for (wexa_tag_entry &entry : tags->entry) {
-        places.insert(places.end(), {&entry.first, &entry.second});
-    }
-    return places;
-}
-
 template <typename info>
 void *create_file(info *to) {
     to->duration = told("duration", all.scripts.back().duration);
     to->tags = &all.tags.emplace_back();
-    for (void **place : buffers_of(to->tags)) *place = malloc(24);
+    to->tags->last = malloc(24);
+    for (wexa_tag_text &text : to->tags->text) text.data = malloc(24);
+    for (wexa_tag_entry &entry : to->tags->entry) {
+        entry.first = malloc(24);
+        entry.second = malloc(24);
+    }
     return make();
 }
 
@@ -218,12 +211,9 @@ std::string call_names() {
 }
 
 bool tags_are_empty() {
-    for (wexa_tags &tags : all.tags) {
-        for (void **place : buffers_of(&tags)) {
-            if (*place) return false;
-        }
-    }
-    return true;
+    const std::string empty = bytes_of(wexa_tags{});
+    return std::all_of(all.tags.begin(), all.tags.end(),
+                       [&empty](const wexa_tags &each) { return bytes_of(each) == empty; });
 }
 
 }  // namespace scripted
