@@ -17,7 +17,7 @@
 namespace {
 
 constexpr int32_t kPair = 2 * sizeof(int16_t);  // bytes
-constexpr int32_t kMinFrame = 10;               // bytes: header, one constant subframe, check sum
+constexpr int64_t kTail = 65'536;               // bytes of the file's end looked at first
 
 struct flac_reader {
     uint8_t reserved[kFlacReaderFlag];
@@ -153,24 +153,28 @@ bool find_sample(flac_reader *r, int64_t sample) {
            FLAC__stream_decoder_seek_absolute(r->decoder, number) != 0 && r->count > 0;
 }
 
-// Where the audio that is there ends: the stated end when a seek finds the sample before it. Else
-// the file is cut, or does not say: the last sample that a seek finds, and on from there.
+// The end of the last block that begins at or behind an offset of the file; 0 without one.
+int64_t last_end(flac_reader *r, int64_t offset) {
+    r->damaged = false;
+    r->at = offset;
+    int64_t end = 0;
+    if (FLAC__stream_decoder_flush(r->decoder) == 0) return 0;
+    while (decode_block(r)) {
+        if (r->block >= 0 && r->block <= kMaxSamples - r->count) {
+            end = std::max(end, r->block + r->count);
+        }
+    }
+    return end;
+}
+
+// Where the audio that is there ends, which need not be where the stream information says: at the
+// end of the last block, looked for from the file's end.
 bool find_end(flac_reader *r) {
-    const int64_t most = std::min(r->file.size / kMinFrame * r->max_block, kMaxSamples - r->base);
-    if (r->stated > 0 && r->stated <= most && find_sample(r, r->stated - 1)) {
-        r->end = r->stated;
-        return true;
+    for (int64_t tail = kTail; r->end == 0 && !r->file.failed; tail *= 4) {
+        r->end = last_end(r, std::max<int64_t>(r->file.size - tail, 0));
+        if (tail >= r->file.size) break;
     }
-    int64_t low = 0;
-    for (int64_t high = r->stated > 0 ? std::min(r->stated, most) : most;
-         high - low > r->max_block;) {
-        const int64_t middle = low + (high - low) / 2;
-        (find_sample(r, middle) ? low : high) = middle;
-    }
-    bool more = find_sample(r, low) || (rewind_stream(r) && decode_block(r));
-    for (; more; more = decode_block(r)) {
-        if (r->block + r->count <= most) r->end = std::max(r->end, r->block + r->count);
-    }
+    if (r->stated > 0) r->end = std::min(r->end, r->stated);
     return !r->file.failed && r->end > 0;
 }
 
