@@ -16,8 +16,8 @@
 
 namespace {
 
-// Written by the callback on the job's thread, which is told nothing of its caller: the pointer
-// hands the result over, the pipe wakes the waiting thread.
+// Written by the callback on the job's thread, which gets no argument of ours: the pointer hands
+// over the result, the pipe wakes the waiting thread.
 std::atomic<const TAVO_INFO *> result{nullptr};
 int done_write_fd = -1;
 

@@ -1,5 +1,5 @@
-// The click track of one analysis. The library writes it to the path in fnamedec and says nothing
-// when it cannot; here that becomes an error, and without a path no file is written at all.
+// The click track of one analysis. The library ignores write errors; the command reports them. No
+// track is written unless one was asked for.
 #ifndef TAVO_CLI_CLICK_H
 #define TAVO_CLI_CLICK_H
 
@@ -14,14 +14,14 @@ struct click_file {
     bool force = false;  // overwrites an existing track
 };
 
-// Points fnamedec at the place for the target, at an empty path when target is empty. input: the
-// file to analyse, which the click track must not replace. An existing file is refused without
-// force. Returns an empty string or what failed.
+// Points fnamedec at a place for the target, or at an empty path when target is empty. input: the
+// file to analyse, which the click track must not replace. Without force an existing file is
+// refused. Returns an empty string or a sentence.
 std::string begin_click(click_file &click, const std::string &target, const std::string &input,
                         bool force);
 
-// After the job: puts a complete track in place, with the RIFF chunks behind its sound, and removes
-// an incomplete one. Returns as above.
+// After the job: gives a complete track its name, with the RIFF chunks appended, and removes an
+// incomplete one. Returns as above.
 std::string finish_click(click_file &click, bool analysed, const std::string &chunks);
 
 #endif

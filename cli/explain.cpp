@@ -30,7 +30,8 @@ std::string seconds_text(int64_t units) {
     return text.data();
 }
 
-// The source opened: the pipeline's own limits are left, or it could not prepare its segments.
+// The source opened, so one of the pipeline's own limits is broken or its segments could not be
+// prepared.
 std::string explain_stream(const mtsrc_format &format) {
     if (format.duration <= kRefusedUnits) {
         return "The audio is too short: it lasts " + seconds_text(format.duration) +

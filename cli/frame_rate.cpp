@@ -28,7 +28,7 @@ int64_t number_of(int64_t frame, const frame_rate &rate) {
     frame += kStartMinutes / 10 * ten_minutes;
     const int64_t tens = frame / ten_minutes;
     const int64_t rest = frame % ten_minutes;
-    const int64_t minutes = rest < minute + dropped ? 0 : (rest - dropped) / minute;
+    const int64_t minutes = rest < dropped ? 0 : (rest - dropped) / minute;
     return frame + dropped * (9 * tens + minutes);
 }
 

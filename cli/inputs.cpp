@@ -28,7 +28,8 @@ uint64_t hash_of(uint64_t device, uint64_t inode, const std::string &name) {
                                     name);
 }
 
-// Decides about an input whose format writes a file. False leaves it out.
+// Claims the marker file of an input, so that no other input writes the same one. False leaves the
+// input out.
 bool claim_target(input_supply &supply, input &entry) {
     const std::string target = marker_path(entry.path, supply.opts);
     const std::string name = base_name(target);

@@ -16,7 +16,7 @@ struct input {
     std::string error;  // a sentence when the input is known to be unusable already, else empty
 };
 
-// A folder under way.
+// A folder that is being searched.
 struct open_folder {
     std::string path;
     std::vector<std::string> names;  // of its entries, in the order of their bytes

@@ -1,4 +1,4 @@
-// The library takes paths of at most 511 bytes and gives one name a meaning of its own.
+// The library takes paths of at most 511 bytes and treats the path "fd" specially.
 #ifndef TAVO_CLI_LIBRARY_PATH_H
 #define TAVO_CLI_LIBRARY_PATH_H
 

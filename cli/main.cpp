@@ -12,8 +12,8 @@
 
 namespace {
 
-// A pipe of ours must not get the number of a standard stream that came closed. Writing to such a
-// stream still fails.
+// Opens /dev/null for each standard stream that is closed, so that no pipe gets its number.
+// Writing to such a stream still fails.
 void hold_standard_streams() {
     for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {
         if (fcntl(fd, F_GETFD) < 0) open("/dev/null", O_RDONLY);

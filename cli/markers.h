@@ -27,8 +27,7 @@ std::vector<mark> marks_of(const record &result);
 // Whether the format writes a file for each input.
 bool writes_files(result_format format);
 
-// The file for an input. A name that would get too long for a file system ends in a number made
-// from the whole name instead.
+// The marker file of an input. A name too long for a file system is cut and numbered.
 std::string marker_path(const std::string &input, const options &opts);
 
 // The file's whole content.

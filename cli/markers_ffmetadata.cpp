@@ -1,5 +1,4 @@
-// FFmpeg's metadata file with chapters: `ffmpeg -i song.m4a -i FILE -map_metadata 1 -codec copy
-// OUT`.
+// FFmpeg's metadata file with chapters; docs/EDITORS.md shows its use.
 #include <algorithm>
 #include <cmath>
 

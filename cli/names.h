@@ -1,4 +1,4 @@
-// File names are bytes. How they are shown to people, and where they are not text at all.
+// File names are bytes. These functions turn them into text for people, for JSON and for URLs.
 #ifndef TAVO_CLI_NAMES_H
 #define TAVO_CLI_NAMES_H
 

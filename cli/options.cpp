@@ -7,6 +7,7 @@
 #include <charconv>
 #include <cstdio>
 #include <iostream>
+#include <sstream>
 
 #include "cli/frame_rate.h"
 #include "cli/markers.h"
@@ -20,25 +21,44 @@ constexpr int32_t kMostSeconds = 86'400;  // a day: beyond any song, far below w
 constexpr int32_t kMostBeats = 1'000'000'000;
 
 constexpr const char *kAbout =
-    "Finds the highlight of songs (where the strongest sustained loud passage starts), their\n"
-    "tempo and their beats.";
+    "Finds the highlight of songs (where the strongest sustained loud passage\n"
+    "starts), their tempo and their beats.";
 
 constexpr const char *kFooter =
-    "A folder is searched for audio files, recognised by content rather than by name. A list\n"
-    "has one name a line (M3U playlists will do) and is read as it comes. Results go to\n"
-    "standard output in the order of the inputs, messages to standard error.\n"
+    "A folder is searched for audio files, recognised by content rather than by\n"
+    "name. A list has one name a line (M3U playlists will do) and is read as it\n"
+    "comes. Results go to standard output in the order of the inputs, messages to\n"
+    "standard error.\n"
     "\n"
-    "The start of a highlight is exact to 0.4 s where the loud passage is louder than about\n"
-    "-13 dBFS RMS; elsewhere it is a point of a 2 s grid, usually 2 to 6 s early, and the text\n"
-    "says \"about\". In mode both the tempo is that of the music from the highlight on.\n"
+    "The start of a highlight is exact to 0.4 s where the loud passage is louder\n"
+    "than about -13 dBFS RMS; elsewhere it is a point of a 2 s grid, usually 2 to\n"
+    "6 s early, and the text says \"about\". In mode both the tempo is that of the\n"
+    "music from the highlight on.\n"
     "\n"
-    "Exit status: 0 all done; 1 a file failed; 2 wrong usage; 130 stopped with Ctrl-C.\n"
+    "Exit status: 0 all done; 1 a file failed; 2 wrong usage; 130 stopped with\n"
+    "Ctrl-C; 141 the reader of the results has gone.\n"
     "\n"
     "Examples:\n"
-    "  tavo song.wav                               a summary for people\n"
-    "  tavo --format json --recursive -j 2 Music   one JSON object a line for each file\n"
-    "  find . -name '*.flac' -print0 | tavo -0 --format csv -\n"
-    "  tavo --format labels --length 30 song.wav   song.wav.labels.txt, for Audacity\n";
+    "  tavo song.wav                    a summary for people\n"
+    "  tavo -f json -r -j 2 Music       one JSON object a line for each file\n"
+    "  find . -name '*.flac' -print0 | tavo -0 -f csv -\n"
+    "  tavo -f labels -l 30 song.wav    song.wav.labels.txt, for Audacity\n";
+
+constexpr size_t kOptionColumns = 28;
+constexpr size_t kTextColumns = 80 - kOptionColumns;
+
+// Breaks the line at spaces.
+std::string wrapped(const std::string &text) {
+    std::string out;
+    size_t used = 0;
+    std::istringstream words(text);
+    for (std::string word; words >> word; used += word.size() + 1) {
+        const bool breaks = used + word.size() > kTextColumns;
+        if (breaks) used = 0;
+        out += (out.empty() ? "" : breaks ? "\n" : " ") + word;
+    }
+    return out;
+}
 
 int wrong_usage(const std::string &sentence) {
     fprintf(stderr, "tavo: %s\nTry 'tavo --help'.\n", sentence.c_str());
@@ -112,12 +132,12 @@ CLI::Validator whole(int32_t least, int32_t most, const char *unit) {
 void declare_analysis(CLI::App &app, options &out, raw_values &raw) {
     app.add_option(
            "-m,--mode", raw.mode,
-           "highlight, beats, or both (default):\nthe highlight, then the beats from there on")
+           "highlight, beats, or both (default): the highlight, then the beats from there on")
         ->check(CLI::IsMember({"highlight", "beats", "both"}).description(""))
         ->type_name("MODE");
     app.add_option(
            "-l,--length", out.length_s,
-           "Length of the highlight wanted: the start is placed\nso that a passage of this length "
+           "Length of the highlight wanted: the start is placed so that a passage of this length "
            "ends at a boundary of the music")
         ->check(whole(0, kMostSeconds, " of seconds"))
         ->type_name("SECONDS");
@@ -125,42 +145,42 @@ void declare_analysis(CLI::App &app, options &out, raw_values &raw) {
         ->check(whole(0, kMostBeats, ""))
         ->type_name("N");
     app.add_option("-j,--jobs", out.jobs,
-                   "Files analysed at once, each in a process of its own;\n1 by default")
+                   "Files analysed at once, each in a process of its own; 1 by default")
         ->check(whole(1, kMostJobs, ""))
         ->type_name("N");
 }
 
 void declare_output(CLI::App &app, options &out, raw_values &raw) {
     app.add_option("-f,--format", raw.format,
-                   "text (default) for people, json: one object a line,\ncsv: one row a file; or "
-                   "markers for an editor, a file beside\neach input: labels (Audacity), kdenlive, "
-                   "losslesscut,\nffmetadata (chapters), edl (DaVinci Resolve), fcpxml,\nreaper; "
-                   "or cue: inside the track of --click. Markers\nspan 30 s of highlight without "
+                   "text (default) for people, json: one object a line, csv: one row a file; or "
+                   "markers for an editor, a file beside each input: labels (Audacity), kdenlive, "
+                   "losslesscut, ffmetadata (chapters), edl (DaVinci Resolve), fcpxml, reaper; "
+                   "or cue: inside the track of --click. Markers span 30 s of highlight without "
                    "--length")
         ->check(CLI::IsMember(format_words()).description(""))
         ->type_name("FORMAT");
     app.add_option("-o,--output-dir", out.output_dir,
-                   "Folder for the marker files; by default they are\nwritten beside each file")
+                   "Folder for the marker files; by default they are written beside each file")
         ->type_name("DIR");
     app.add_option("--fps", raw.fps,
-                   "Frames a second for edl and fcpxml: 23.976, 24, 25,\n29.97, 29.97df "
-                   "(drop-frame), 30 (default), 50, 59.94,\n59.94df, 60")
+                   "Frames a second for edl and fcpxml: 23.976, 24, 25, 29.97, 29.97df "
+                   "(drop-frame), 30 (default), 50, 59.94, 59.94df, 60")
         ->check(CLI::IsMember(frame_rate_names()).description(""))
         ->type_name("RATE");
     app.add_flag("--force", out.force,
-                 "Overwrite marker files, click tracks and pictures\nthat exist");
+                 "Overwrite marker files, click tracks and pictures that exist");
     app.add_flag("--skip-existing", out.skip_existing, "Leave out inputs whose marker file exists");
     app.add_option("--click", out.click,
-                   "Write the analysed sound with a click on every beat, a\nWAV file; from the "
+                   "Write the analysed sound with a click on every beat, a WAV file; from the "
                    "highlight on in "
                    "mode both; one input only")
         ->type_name("WAV");
     app.add_option("--plot", out.plot,
-                   "Draw the result, an SVG file: waveform, loudness,\nhighlight and beats; one "
+                   "Draw the result, an SVG file: waveform, loudness, highlight and beats; one "
                    "input only")
         ->type_name("SVG");
     app.add_option("--report", out.report,
-                   "Write a page that shows and plays the song, an HTML file;\nfor several inputs "
+                   "Write a page that shows and plays the song, an HTML file; for several inputs "
                    "an index, the pages in a folder beside it")
         ->type_name("HTML");
     app.add_flag("--embed", out.embed, "Put the sound into the page");
@@ -169,25 +189,25 @@ void declare_output(CLI::App &app, options &out, raw_values &raw) {
 
 void declare_catalogue(CLI::App &app, options &out, raw_values &raw) {
     app.add_option("--store", out.store,
-                   "Keep the results in a database: sqlite:FILE, FILE.db or\n"
-                   "postgresql://HOST/DATABASE. Songs that it knows are left\nout; standard output "
+                   "Keep the results in a database: sqlite:FILE, FILE.db or "
+                   "postgresql://HOST/DATABASE. Songs that it knows are left out; standard output "
                    "is used only with --format")
         ->type_name("URL");
     app.add_flag("--retry-failed", out.retry_failed, "Analyse songs again that failed");
     app.add_flag("--redo", out.redo, "Analyse every song again");
     app.add_flag("--from-store", out.from_store,
-                 "Write out what the store holds for --mode, --length and\n--max-beats; analyses "
+                 "Write out what the store holds for --mode, --length and --max-beats; analyses "
                  "nothing");
     app.add_option("--patience", out.patience_s,
-                   "How long a store that does not answer is tried again;\n60 by default")
+                   "How long a store that does not answer is tried again; 60 by default")
         ->check(whole(0, kMostSeconds, " of seconds"))
         ->type_name("SECONDS");
     app.add_option("--shard", raw.shard,
-                   "Only the share I of N of the inputs, for engines that run\none command many "
-                   "times; auto: as Slurm, Kubernetes or\nAWS Batch says")
+                   "Only the share I of N of the inputs, for engines that run one command many "
+                   "times; auto: as Slurm, Kubernetes or AWS Batch says")
         ->type_name("I/N");
     app.add_option("--forecast", out.forecast,
-                   "Analyse a random sample of a list and say what all of it\nneeds")
+                   "Analyse a random sample of a list and say what all of it needs")
         ->type_name("LIST");
     app.add_option("--sample", out.sample, "Files in the sample; 1000 by default")
         ->check(whole(2, kMostBeats, ""))
@@ -317,13 +337,16 @@ void write_notes(const options &out) {
 std::optional<int> parse_options(int argc, char **argv, options &out) {
     CLI::App app(kAbout, "tavo");
     app.footer(kFooter);
-    app.get_formatter()->column_width(28);
+    app.get_formatter()->column_width(kOptionColumns);
     app.set_version_flag("--version", std::string("tavo ") + TAVO_VERSION);
     raw_values raw;
     declare_inputs(app, out, raw);
     declare_analysis(app, out, raw);
     declare_output(app, out, raw);
     declare_catalogue(app, out, raw);
+    for (CLI::Option *option : app.get_options()) {
+        option->description(wrapped(option->get_description()));
+    }
     try {
         app.parse(shielded(argc, argv));
     } catch (const CLI::Success &done) {

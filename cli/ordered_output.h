@@ -1,5 +1,5 @@
-// Replies arrive in any order and leave in the order of the inputs: results on standard output,
-// messages on standard error, the progress line out of their way.
+// Writes replies in the order of the inputs, whatever order they arrive in: results to standard
+// output, messages to standard error. The progress line is cleared first.
 #ifndef TAVO_CLI_ORDERED_OUTPUT_H
 #define TAVO_CLI_ORDERED_OUTPUT_H
 

@@ -1,4 +1,4 @@
-// Files that the command writes: complete under their name or not there at all.
+// Output files, written atomically.
 #ifndef TAVO_CLI_OUTPUT_FILE_H
 #define TAVO_CLI_OUTPUT_FILE_H
 
@@ -16,14 +16,14 @@ bool same_file(const std::string &a, const std::string &b);
 
 // These return an empty string or a sentence that says what failed.
 
-// Whether the target could be written: the folder can be and, without force, the target is not
-// there. Makes nothing.
+// Checks that the target can be written: its folder is writable and, without force, the target
+// does not exist. Creates nothing.
 std::string check_target(const std::string &target, bool force);
 
 std::string begin_output(output_file &file, const std::string &target);
 std::string write_output(output_file &file, const std::string &content);
 
-// Gives the file its name; without force an existing target stays and the temporary is removed.
+// Gives the file its name. Without force an existing target stays and the temporary is removed.
 std::string commit_output(output_file &file, bool force);
 
 // Removes what is left. Harmless after a commit and when called twice.

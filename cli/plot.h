@@ -1,6 +1,6 @@
 // The picture of one file's result: --plot.
 //
-// In: a record (record.h) and the file it is about. Out: an SVG file, whole or not there.
+// In: a record (record.h) and the file it is about. Out: an SVG file, written atomically.
 // draw_plot: after analyse.h, in the worker. gather_plot reads the sound, plot_svg draws.
 #ifndef TAVO_CLI_PLOT_H
 #define TAVO_CLI_PLOT_H
@@ -34,8 +34,8 @@ struct plot_data {
     int32_t peak = 0;              // greatest magnitude of a sample, 0 to 32768
 };
 
-// Whether the picture could be written and would not replace the input. Makes nothing. Returns an
-// empty string or a sentence.
+// Checks that the picture can be written and would not replace the input. Creates nothing. Returns
+// an empty string or a sentence.
 std::string check_plot(const std::string &target, const std::string &input, bool force);
 
 // Draws what was found into opts.plot. A failure or a stop is entered into the record.

@@ -17,10 +17,10 @@ constexpr int kRedrawMs = 500;
 
 progress start_progress(bool quiet);
 
-// Draws the line anew, once the work has taken a moment, unless it is about a single file.
+// Redraws the line, once the work has taken a second. Draws nothing for a single file.
 void draw_progress(progress &bar, size_t done);
 
-// Takes the line off the terminal, before anything else is written there.
+// Clears the line; call this before writing anything else to the terminal.
 void clear_progress(progress &bar);
 
 #endif

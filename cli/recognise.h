@@ -1,4 +1,4 @@
-// What a file's content is: the media source is asked, whatever the file's name says.
+// What a file contains, by its content rather than by its name.
 #ifndef TAVO_CLI_RECOGNISE_H
 #define TAVO_CLI_RECOGNISE_H
 

@@ -7,7 +7,7 @@
 // Returns false when the system refuses.
 bool watch_for_stop();
 
-// In a worker process, which stops when its request pipe ends: such signals mean nothing there.
+// In a worker process, which ends with its request pipe: ignores these signals there.
 void ignore_stop_signals();
 
 bool stop_requested();

@@ -13,8 +13,8 @@ typedef std::vector<std::pair<const char *, std::string>> attributes;  // values
 std::string decimal(double value, int digits);
 std::string point(double x, double y);
 
-// Text for an element: escaped, and what XML does not have becomes U+FFFD, as bytes that are no
-// characters do.
+// Escapes the text of an element. Characters that XML forbids and bytes that are not UTF-8 become
+// U+FFFD.
 std::string xml(const std::string &bytes);
 std::string xml_attribute(const std::string &bytes);
 
@@ -32,7 +32,7 @@ std::string stroke(const char *id, const char *colour, double width, const std::
 attributes line(double x1, double y1, double x2, double y2, const char *colour, double width,
                 const char *dashes);
 
-// A line with a name.
+// A line element with an id.
 std::string named_line(const char *id, attributes with);
 
 #endif

@@ -12,7 +12,7 @@ const char *mode_word(int32_t mode);
 int32_t mode_of(const std::string &word);  // TAVO_MODE_*; the words' inverse
 const char *status_word(outcome status);
 
-// m:ss.t, or h:mm:ss.t from an hour on; without tenths where the time is a whole second anyway.
+// m:ss.t, or h:mm:ss.t from an hour on; whole_clock_text leaves out the tenths.
 std::string clock_text(double ms);
 std::string whole_clock_text(double ms);
 

@@ -1,5 +1,5 @@
-// A worker process: files in, finished texts out. The library holds one instance a process, so
-// this is what makes several analyses at once possible, and what keeps a crash to its own file.
+// A worker process: files in, finished texts out. The library allows one instance per process:
+// workers run several analyses at once and confine a crash to its own file.
 //
 // Between the command and a worker run two pipes. A request is a request_head, a path and, for a
 // song that the store knows, its result as JSON; it is sent only while the worker has none. The end
