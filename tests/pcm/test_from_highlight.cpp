@@ -1,4 +1,3 @@
-#include <array>
 #include <memory>
 
 #include "pcm/from_highlight.h"
@@ -128,15 +127,15 @@ TEST_F(from_highlight, comparison_reads_its_record_alone) {
     seg->fmt.sample_rate = kRate;
     seg->src = ctx.seg[0].src;
     seg->start = 10'000'000;
-    // The buffer's bytes, which a duration of 0 does not tell.
-    for (const auto &[duration, bytes, landed] :
-         {std::array<int64_t, 3>{41'250'000, 50'000, 50'000 - kBlock - 200},
-          {41'250'000, 50'000, 50'000 - kBlock - 199},
-          {0, kBytes, 60'000}}) {
+    // The record tells 50,000 bytes, and with a duration of 0 no number.
+    const sample_run pcm = samples_of(stream);
+    for (const auto &[duration, landed] :
+         {std::pair<int64_t, int64_t>{41'250'000, 50'000 - kBlock - 200},
+          {41'250'000, 50'000 - kBlock - 199},
+          {0, 60'000}}) {
         const bool found = landed != 50'000 - kBlock - 199;
         seg->duration = duration;
         sources[0].at = landed;
-        const sample_run pcm = samples_of(slice(stream, 0, bytes));
         int64_t off = 43'000;
         EXPECT_EQ(_compare_decoded(seg.get(), pcm.data(), &off), found ? 0 : -1);
         EXPECT_EQ(off, found ? landed : 43'000);

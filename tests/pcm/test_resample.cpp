@@ -127,9 +127,12 @@ TEST(resample_sinc, arithmetic_by_hand) {
     // Halves go up: 1.5 to 2, and of the two outer ones (3 - 20,000) / 2 = -9998.5 to -9998.
     EXPECT_EQ(filtered(three_taps(0, 0.5f, 0), in)[3], 2);
     EXPECT_EQ(filtered(three_taps(0.5f, 0, 0.5f), in)[2], -9998);
-    // Two channels: 2 frames, then (1 + 2) * 2 = 6.
-    EXPECT_EQ(filtered(three_taps(1, 1, 0, 1.0f, 2), {1, 20, 3, 40, 5, 60}),
-              (sample_run{1, 20, 4, 60, 77, 77, 4}));
+    // Two channels: each adds its last sample, up to (11 + 1) * 2 = 24.
+    sample_run pairs(24);
+    std::iota(pairs.begin(), pairs.end(), int16_t{0});
+    const sample_run sums = filtered(three_taps(1, 1, 0, 1.0f, 2), pairs);
+    EXPECT_EQ(slice(sums, 0, 6), (sample_run{0, 1, 2, 4, 6, 8}));
+    EXPECT_EQ(slice(sums, 20, 25), (sample_run{38, 40, 77, 77, 22}));
     const auto wide = [](int16_t sample, float a, float b, float c) {
         return slice(filtered(three_taps(a, b, c), sample_run(20, sample)), 1, 18);
     };
