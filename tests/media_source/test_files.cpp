@@ -94,7 +94,7 @@ void expect_type(int32_t type, const std::vector<std::string> &contents) {
 
 TEST(Recognise, FilesByTheirHeads) {
     std::string long_tag = id3((1 << 21) + (3 << 14) + (2 << 7) + 5);
-    for (const size_t at : {6, 8}) long_tag[at] |= '\x80';  // its top bits are not looked at
+    for (const size_t at : {6u, 8u}) long_tag[at] |= '\x80';  // its top bits are not looked at
     expect_type(2002, {kAsf});
     expect_type(2000, {"1234ftyp", "1234mdat", "1234moov"});
     expect_type(322, {"fLaC", long_tag + "fLaC"});

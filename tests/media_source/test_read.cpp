@@ -136,8 +136,8 @@ TEST_F(Reading, ReductionsAndTheDelayOfMpegDecoders) {
 // The largest block, 65,535 sample pairs, decodes to twice the bytes that the queue has room for.
 TEST_F(Reading, FlacHasRoomForItsLargestBlock) {
     samples block, expected;
-    for (int32_t i = 0; i < 131'070; ++i) block.push_back(static_cast<int16_t>(i / 2));
-    for (int32_t i = 0; i < 655'350; ++i) expected.push_back(block[i % 65'535 * 2]);
+    for (size_t i = 0; i < 131'070; ++i) block.push_back(static_cast<int16_t>(i / 2));
+    for (size_t i = 0; i < 655'350; ++i) expected.push_back(block[i % 65'535 * 2]);
     open_frames(row_of("flac"), frames(10, {block, 1}));
     result got = read(kAll);
     const result rest = read(kAll);
