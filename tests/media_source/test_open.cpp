@@ -104,6 +104,10 @@ TEST_F(OpenClose, VorbisSetUpDataReachTheDecoder) {
         plan.setup_length = length;
         EXPECT_EQ(open_row(row_of("ogg"), plan), -7);
     }
+    plan.setup = std::string(24, 'x');  // a size that malloc gives out without more
+    plan.setup_length.reset();
+    ASSERT_EQ(open_row(row_of("ogg"), plan), 0);
+    EXPECT_EQ(scripted::calls_of("_get_format").back().number, 24);
 }
 
 TEST_F(OpenClose, WithoutAHandleAProbeFileOrTheMark) {

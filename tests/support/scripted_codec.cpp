@@ -1,5 +1,7 @@
 #include "tests/support/scripted_codec.h"
 
+#include <malloc.h>
+
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
@@ -340,6 +342,7 @@ int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
     if (buf) {  // *length says how much it holds
         reported = std::clamp(*length, 0, static_cast<int32_t>(setup.size()));
         memcpy(buf, setup.data(), static_cast<size_t>(reported));
+        all.calls.back().number = static_cast<int32_t>(malloc_usable_size(buf));
     }
     *length = told("length", reported);
     return 0;
