@@ -56,9 +56,9 @@ void analyse(TAVO_CTX *tavo, int32_t mode, fuzz::input *in) {
              "only a result has beats");
         must((last.beat_times == nullptr) == (last.beat_count == 0), "no beats, no list");
     }
-    must(last.hl_pos >= 0 && last.hl_pos <= tavo->duration / kUnitsPerMs,
-         "a highlight starts in the song");
+    const int64_t duration_ms = tavo->duration / kUnitsPerMs;
     must(tavo_deinit(tavo) == TAVO_OK, "a release is done");
+    must(last.hl_pos >= 0 && last.hl_pos <= duration_ms, "a highlight starts in the song");
     must(calls == 1, "a job reports once");
     sem_destroy(&called);
 }
