@@ -11,7 +11,8 @@
 extern "C" {
 
 // Decodes the plan into pcm, as large as pcm_bytes says, and sets pcm_bytes to the bytes decoded, 0
-// on failure. The segments' buffers are freed.
+// on failure. pcm may move. The segments' buffers are freed: the segments are decoded in parts of
+// pcm.
 void decode_song(TAVO_CTX *ctx);
 
 // tavo_get_from_here, which see; a second decoding leaves no segment buffers behind.

@@ -4,7 +4,6 @@
 #include <cstring>
 
 #include "pcm/block_search.h"
-#include "pcm/song.h"
 
 namespace {
 
@@ -16,8 +15,10 @@ int64_t find_seam(const uint8_t *dst, int64_t total, const uint8_t *data, int64_
     return seam == kNoPlace ? total : seam;
 }
 
-int64_t copy_segments(TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst, int64_t capacity,
-                      bool keep) {
+}  // namespace
+
+int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
+                        int64_t capacity) {
     const int64_t skip = second_bytes(rate);
     if (dst == nullptr || capacity < 1 || skip < 1) return 0;
 
@@ -32,19 +33,9 @@ int64_t copy_segments(TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *ds
         if (k > 0) total = find_seam(dst, total, data, avail);
         const int64_t bytes = std::min(capacity - total, avail);
         if (bytes < 1) return 0;
-        memcpy(dst + total, data, static_cast<size_t>(bytes));
+        memmove(dst + total, data, static_cast<size_t>(bytes));
         total += bytes;
-        if (!keep) free_segment_buffer(&seg[k]);
     }
-    return total;
-}
-
-}  // namespace
-
-int64_t stitch_segments(TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
-                        int64_t capacity, bool keep) {
-    const int64_t total = copy_segments(seg, count, rate, dst, capacity, keep);
-    for (int32_t k = 0; k < count && !keep; ++k) free_segment_buffer(&seg[k]);
     return total;
 }
 

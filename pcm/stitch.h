@@ -15,11 +15,10 @@ inline int64_t second_bytes(int32_t rate) {
     return rate * kBytesPerSample;
 }
 
-// Copies the count decoded segments to dst (capacity bytes), each from the place where the output
-// already holds the same bytes, or at its end. Returns the bytes written, 0 when a segment has
-// nothing to give. Unless keep is set, each segment's buffer is freed once it is copied, and all of
-// them in the end.
-int64_t stitch_segments(TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
-                        int64_t capacity, bool keep);
+// Moves the count decoded segments to dst (capacity bytes), each to the place where the output
+// already holds the same bytes, or to its end. dst may be the memory of the segments' buffers, if
+// these lie in it in order. Returns the bytes written, 0 when a segment has nothing to give.
+int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
+                        int64_t capacity);
 
 #endif
