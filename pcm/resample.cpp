@@ -39,8 +39,12 @@ bool plan_conversion(int64_t bytes, int32_t source_rate, int32_t ana_rate, conve
 int32_t run_blocks(const conversion &plan, const int16_t *in, double *out) {
     const int32_t err = worker_lock_create(&ext_mutex_resample, &ext_cond_resample);
     if (err != 0) return err;
-    if (!average_on_threads(in, plan.count, plan.ratio, out, plan.n)) {
+    const bool in_place = static_cast<const void *>(in) == out;
+    const int64_t n = in_place ? std::min(plan.n, exact_blocks(kMaxWholeRatio)) : plan.n;
+    if (!average_on_threads(in, plan.count, plan.ratio, out, n)) {
         std::fill_n(out, plan.n, 0.0);
+    } else if (n < plan.n) {
+        average_behind_exact(in, plan.count, out, plan.n);
     }
     worker_lock_release(&ext_mutex_resample, &ext_cond_resample);
     return 0;
@@ -74,7 +78,7 @@ int32_t run_conversion(const conversion &plan, const int16_t *in, double *out) {
 // there, and blocks of four samples take the room of one output.
 bool works_in_place(const conversion &plan) {
     const int32_t whole = whole_ratio(plan.ratio);
-    return whole == 0 || (whole == kMaxWholeRatio && plan.n <= exact_blocks(whole));
+    return whole == 0 || whole == kMaxWholeRatio;
 }
 
 // Converts pcm in its own memory, which becomes the output's. Returns null, with pcm as it was,

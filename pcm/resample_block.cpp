@@ -28,15 +28,17 @@ double block_mean(const int16_t *in, int64_t first, int64_t end) {
     return static_cast<double>(sum / static_cast<float>(end - first));
 }
 
-// Blocks of any length.
-void average_blocks(const RESAMPLE_PART *part, int64_t first, int64_t end) {
+// Outputs [first, end), whose blocks of the count samples have any length. in holds the samples
+// from base on.
+void average_blocks(float ratio, const int16_t *in, int64_t base, int64_t count, double *out,
+                    int64_t first, int64_t end) {
     for (int64_t i = first; i < end; ++i) {
-        const int64_t from = block_start(part->ratio, i, part->in_count);
-        const int64_t to = block_start(part->ratio, i + 1, part->in_count);
+        const int64_t from = block_start(ratio, i, count);
+        const int64_t to = block_start(ratio, i + 1, count);
         if (from < to) {
-            part->out[i] = block_mean(part->in, from, to);
+            out[i] = block_mean(in, from - base, to - base);
         } else {  // rounding left the block empty: take the sample there, or the last one
-            part->out[i] = part->in[std::min(from, part->in_count - 1)];
+            out[i] = in[std::min(from, count - 1) - base];
         }
     }
 }
@@ -91,7 +93,7 @@ void average_part(void *record) {
     if (whole == 2) average_whole<2>(part->in, part->out, part->first, exact);
     if (whole == 3) average_whole<3>(part->in, part->out, part->first, exact);
     if (whole == 4) average_fours(part->in, part->out, part->first, exact);
-    average_blocks(part, exact, part->end);
+    average_blocks(part->ratio, part->in, 0, part->in_count, part->out, exact, part->end);
 }
 
 }  // namespace
@@ -144,6 +146,19 @@ bool average_on_threads(const int16_t *in, int64_t count, float ratio, double *o
     free(done);
     free(parts);
     return ready;
+}
+
+void average_behind_exact(const int16_t *in, int64_t count, double *out, int64_t n) {
+    // Outputs. The place of every kStep-th is exact in the songs of up to 72 days, so that no block
+    // of a step reaches further than one sample into the next.
+    constexpr int64_t kStep = 4096;
+    int16_t window[4 * kStep + 1];
+    for (int64_t first = exact_blocks(4); first < n; first += kStep) {
+        const int64_t begin = 4 * first;
+        const int64_t end = std::min(begin + 4 * kStep + 1, count);
+        memcpy(window, in + begin, static_cast<size_t>(end - begin) * sizeof *in);
+        average_blocks(4.0f, window, begin, count, out, first, std::min(first + kStep, n));
+    }
 }
 
 void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, double *out,

@@ -18,6 +18,10 @@ int64_t exact_blocks(int32_t whole);
 // it was, when memory runs out.
 bool average_on_threads(const int16_t *in, int64_t count, float ratio, double *out, int64_t n);
 
+// The outputs of the block average at ratio 4 from exact_blocks(4) to n. out may be the memory of
+// in: blocks that begin before their output are read ahead of it.
+void average_behind_exact(const int16_t *in, int64_t count, double *out, int64_t n);
+
 // dorn_resampler_convert that stops after max_frames frames. On long inputs the single-precision
 // position lags far enough for the conversion to give more frames than the rates say.
 int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
