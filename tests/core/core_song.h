@@ -5,42 +5,44 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
+#include <initializer_list>
 #include <string>
 
+#include "tests/support/job_harness.h"
 #include "tests/support/song.h"
 
 namespace core_song {
 
-inline const support::song &samples() {
-    static const support::song song = [] {
-        support::song_spec plan;
-        plan.rate = 22050;
-        plan.channels = 1;
-        plan.seconds = 100.0;
-        plan.loud_at = 41.0;
-        plan.tail_at = 80.0;
-        return support::make_song(plan);
-    }();
-    return song;
-}
+constexpr std::initializer_list<int32_t> kModes = {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS,
+                                                   TAVO_MODE_BOTH};
 
 // A WAV file for as long as the program runs.
 struct file {
-    explicit file(const support::song &song)
-        : path(testing::TempDir() + "tavo_core_" + std::to_string(getpid()) + "_" +
-               std::to_string(song.pcm.size()) + ".wav") {
+    explicit file(support::song of) : song(std::move(of)) {
         EXPECT_TRUE(support::write_wav(path, song));
     }
     ~file() { unlink(path.c_str()); }
-    file(const file &) = delete;
-    file &operator=(const file &) = delete;
 
-    const std::string path;
+    const support::song song;
+    const std::string path = testing::TempDir() + "tavo_core_" + std::to_string(getpid()) + "_" +
+                             std::to_string(song.pcm.size()) + ".wav";
 };
 
-inline const std::string &path() {
-    static const file whole(samples());
-    return whole.path;
+inline const file &whole() {
+    static const file made(support::make_song({22050, 1, 100.0, 120.0, 1, 41.0, 80.0}));
+    return made;
+}
+
+// An instance of the song in each mode, which the action releases.
+template <typename action>
+void for_each_mode(std::initializer_list<int32_t> modes, action act) {
+    for (const int32_t mode : modes) {
+        SCOPED_TRACE(mode);
+        int32_t err = 99;
+        TAVO_CTX *ctx = job::create(whole().path, mode, &err);
+        EXPECT_EQ(err, 0);
+        if (ctx != nullptr) act(mode, ctx);
+    }
 }
 
 }  // namespace core_song
