@@ -1,0 +1,96 @@
+"""What the repository promises: folders include downwards only, and the library exports and asks for what it
+should. Each check is shown to fail. Arguments: the repository, the library, the list of exported names."""
+import pathlib
+import re
+import subprocess
+import sys
+import tempfile
+import unittest
+
+ROOT, LIBRARY, NAMES = (pathlib.Path(sys.argv.pop(1)) for _ in range(3))
+ALLOWED = {  # each folder and the floors below it that it may include
+    "common": set(),
+    "dsp": {"common"},
+    "media_source": {"common"},
+    "pcm": {"common", "media_source"},
+    "highlight": {"common", "dsp"},
+    "beat": {"common", "dsp"},
+    "core": {"common", "dsp", "media_source", "pcm", "highlight", "beat"},
+    "jni": {"core"},
+    "java": {"core"},
+    "python": {"core"},
+    "cli": {"common", "core"},
+    "desktop": set(),
+}
+PUBLIC = {"core/tavo.h"}  # from everywhere
+SINGLE = {  # headers that a folder may take from one it may not include otherwise
+    "cli": {"media_source/mtsrc.h", "highlight/power_envelope.h", "highlight/search.h"},
+    # The stand-in takes the codec library's interface and nothing else.
+    "desktop": {"android/log.h", "media_source/wexaaudio.h", "media_source/mtsrc_io.h"},
+}
+# A codec of a package in this list would tie the library to that package.
+NEEDED = ("libwexaaudio.so", "liblog.so", "libc.so", "libm.so", "libstdc++.so", "libgcc_s.so", "libpthread.so",
+          "ld-linux", "libasan.so", "libubsan.so", "libtsan.so")
+
+
+def includes(root):
+    """Each include of a folder's source: the folder, the file and what it includes."""
+    for folder in ALLOWED:
+        for path in sorted((root / folder).rglob("*")):
+            if path.suffix in (".h", ".cpp", ".c"):
+                for target in re.findall(r'^\s*#\s*include\s*"([^"]+)"', path.read_text('utf-8'), re.MULTILINE):
+                    yield folder, path.relative_to(root), target
+
+
+def wrong_includes(root):
+    return [f"{path}: {target}" for folder, path, target in includes(root)
+            if target.split("/")[0] not in ALLOWED[folder] | {folder}
+            and target not in PUBLIC | SINGLE.get(folder, set())]
+
+
+def run(*command):
+    return subprocess.run(command, check=True, capture_output=True, text=True).stdout
+
+
+def flaws_of(library, names):
+    """Names that only one of both has, libraries asked for that are not in NEEDED, and thread-local storage,
+    whose first use in a loaded library takes memory that may not be there."""
+    symbols = run("nm", "-D", "--defined-only", library).splitlines()
+    exported = [line.split()[-1].split("@")[0] for line in symbols]
+    needed = re.findall(r"\(NEEDED\).*\[(.*)\]", run("readelf", "-d", library))
+    foreign = {name for name in needed if not name.startswith(NEEDED)}
+    storage = {word for word in run("readelf", "-lW", library).split() if word == "TLS"}
+    return {*names} ^ {*exported} | foreign | storage
+
+
+class Repository(unittest.TestCase):
+    def test_include_directions(self):
+        self.assertGreater(len([*includes(ROOT)]), 100)
+        self.assertEqual(wrong_includes(ROOT), [])
+        for source, target, right in (
+                ("dsp/a.cpp", "dsp/b.h", True), ("dsp/a.cpp", "common/tavo_ctx.h", True),
+                ("dsp/a.cpp", "beat/b.h", False), ("highlight/a.h", "pcm/b.h", False),
+                ("media_source/a.cpp", "desktop/b.h", False), ("beat/a.cpp", "highlight/b.h", False),
+                ("core/a.cpp", "beat/b.h", True), ("core/a.cpp", "jni/b.h", False), ("java/a.cpp", "beat/b.h", False),
+                ("desktop/a.c", "core/tavo.h", True), ("cli/a.cpp", "media_source/mtsrc.h", True),
+                ("cli/a.cpp", "media_source/mtsrc_ctx.h", False), ("cli/a.cpp", "highlight/search.h", True),
+                ("cli/a.cpp", "highlight/region.h", False), ("desktop/x/a.cpp", "media_source/mtsrc_ctx.h", False)):
+            with self.subTest(source=source, target=target), tempfile.TemporaryDirectory() as folder:
+                path = pathlib.Path(folder, source)
+                path.parent.mkdir(parents=True)
+                path.write_text(f'#include "{target}"\n')
+                self.assertEqual(wrong_includes(pathlib.Path(folder)), [] if right else [f"{source}: {target}"])
+
+    def test_exports(self):
+        names = [name for name in NAMES.read_text().split("\n") if name and not name.startswith("#")]
+        self.assertEqual(len(names), len(set(names)))
+        self.assertEqual(flaws_of(LIBRARY, names), set())
+        self.assertEqual(flaws_of(LIBRARY, {"tavo_other", *names} - {"tavo_init"}), {"tavo_other", "tavo_init"})
+        # The C library has thread-local storage, a module of the stand-in needs the codecs of a package.
+        libc = re.search(r"\S+/libc\.so\S*", pathlib.Path("/proc/self/maps").read_text())[0]
+        self.assertIn("TLS", flaws_of(libc, []))
+        self.assertIn("libav", " ".join(flaws_of(LIBRARY.parent / "libwexaaudio_av.so", [])))
+
+
+if __name__ == "__main__":
+    unittest.main()
