@@ -1,5 +1,4 @@
-"""The man page and the completion know the options that the command has, and no others."""
-import os
+"""The man page and the completions know the options that the command has, and no others."""
 import pathlib
 import re
 import subprocess
@@ -7,85 +6,66 @@ import sys
 import tempfile
 import unittest
 
-TAVO, PACKAGING = (os.path.abspath(sys.argv.pop(1)) for _ in range(2))
-PAGE = pathlib.Path(PACKAGING, "tavo.1")
-COMPLETION, ZSH, FISH = (pathlib.Path(PACKAGING, "tavo." + shell) for shell in ("bash", "zsh", "fish"))
+TAVO, PACKAGING = (pathlib.Path(sys.argv.pop(1)).resolve() for _ in range(2))
+PAGE, BASH, ZSH, FISH = (PACKAGING / f"tavo.{end}" for end in ("1", "bash", "zsh", "fish"))
 OPTION = re.compile(r"(?<![\w-])(--[a-z][a-z-]*|-[a-zA-Z0-9])(?![\w-])")
 
 
-def options_of_the_command():
-    help_text = subprocess.run([TAVO, "--help"], check=True, capture_output=True, text=True).stdout
-    names = set()
-    for line in help_text.splitlines():
-        if line.startswith("  -"):
-            names |= set(OPTION.findall(re.split(r"\s{2,}|\s[A-Z]", line.strip())[0]))
-    return names
+def run(*command):
+    return subprocess.run(command, check=True, capture_output=True, text=True)
 
 
-def complete(folder, *words):
-    """What the completion offers for the last of the words."""
+def complete(*words, folder="/"):
+    """What bash offers for the last of the words."""
     script = ('source "$1"; cd "$2"; shift 2; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); _tavo; '
-              'printf "%s\\n" "${COMPREPLY[@]}"')
-    said = subprocess.run(["bash", "--norc", "-c", script, "bash", COMPLETION, folder, *words],
-                          check=True, capture_output=True, text=True)
+              'for word in "${COMPREPLY[@]}"; do echo "$word"; done')
+    said = run("bash", "--norc", "-c", script, "bash", BASH, folder, "tavo", *words)
     assert said.stderr == "", said.stderr
-    return sorted(said.stdout.split("\n")[:-1]) if said.stdout != "\n" else []
+    return sorted(said.stdout.splitlines())
 
 
 def complete_in_fish(word):
-    script = f"source '{FISH}'; complete -C 'tavo {word}'"
-    said = subprocess.run(["fish", "--no-config", "-c", script], check=True, capture_output=True,
-                          text=True).stdout
+    said = run("fish", "--no-config", "-c", f"source '{FISH}'; complete -C 'tavo {word}'").stdout
     return sorted(line.split("\t")[0] for line in said.splitlines())
 
 
 class Papers(unittest.TestCase):
     def test_options(self):
-        expected = options_of_the_command()
+        lines = re.findall(r"^  (-.*?)(?:\s{2,}|\s[A-Z]|$)", run(TAVO, "--help").stdout, re.MULTILINE)
+        expected = set(OPTION.findall("\n".join(lines)))
         self.assertGreater(len(expected), 15)
         section = PAGE.read_text().split(".SH OPTIONS")[1].split(".SH OUTPUT")[0]
         heads = "\n".join(part.splitlines()[0] for part in section.split(".TP\n")[1:])
         self.assertEqual(set(OPTION.findall(heads.replace("\\-", "-"))), expected)
-        self.assertEqual(set(complete("/", "tavo", "-")), expected)
-        self.assertEqual(set(complete_in_fish("-")) | set(complete_in_fish("--")), expected)
-        subprocess.run(["zsh", "-n", ZSH], check=True)
-        offered = re.sub(r"_arguments.*|\[.*?\]", "", ZSH.read_text())
-        self.assertEqual(set(OPTION.findall(offered)), expected)
+        self.assertEqual(set(complete("-")), expected)
+        self.assertEqual({*complete_in_fish("-"), *complete_in_fish("--")}, expected)
+        run("zsh", "-n", ZSH)
+        self.assertEqual(set(OPTION.findall(re.sub(r"_arguments.*|\[.*?\]", "", ZSH.read_text()))), expected)
 
     def test_choices(self):
         """What is completed for an option's value is what the option takes."""
         for option in ("--mode", "--format", "--fps"):
             refused = subprocess.run([TAVO, option, "?", "x"], capture_output=True, text=True)
-            choices = sorted(re.search(r"{(.*)}", refused.stderr).group(1).split(","))
-            self.assertEqual(complete("/", "tavo", option, ""), choices)
+            choices = sorted(re.search(r"{(.*)}", refused.stderr)[1].split(","))
+            self.assertEqual(complete(option, ""), choices)
             self.assertEqual(complete_in_fish(option + " "), choices)
             (offered,) = re.findall(option + r"=(?:}')?\[.*:\((.*)\)'", ZSH.read_text())
             self.assertEqual(sorted(offered.split()), choices)
 
     def test_page_is_clean(self):
-        done = subprocess.run(["groff", "-man", "-ww", "-Tutf8", "-z", PAGE], check=True,
-                              capture_output=True, text=True)
+        done = run("groff", "-man", "-ww", "-Tutf8", "-z", PAGE)
         self.assertEqual(done.stdout + done.stderr, "")
 
     def test_completion(self):
         with tempfile.TemporaryDirectory() as folder:
-            os.mkdir(os.path.join(folder, "music"))
+            pathlib.Path(folder, "music").mkdir()
             for name in ("a song.wav", "-odd.wav"):
                 pathlib.Path(folder, name).touch()
-            cases = [
-                (["--mo"], ["--mode"]),
-                (["--mode", ""], ["beats", "both", "highlight"]),
-                (["-m", "h"], ["highlight"]),
-                (["--format", "=", "js"], ["json"]),
-                (["--jobs", ""], []),
-                (["--output-dir", ""], ["music"]),
-                (["a"], ["a song.wav"]),
-                (["--", "-"], ["-odd.wav"]),
-                (["--force", ""], ["-odd.wav", "a song.wav", "music"]),
-            ]
-            for words, offered in cases:
-                with self.subTest(words=words):
-                    self.assertEqual(complete(folder, "tavo", *words), offered)
+            for words, offered in (
+                    (["--mo"], ["--mode"]), (["-m", "h"], ["highlight"]), (["--format", "=", "js"], ["json"]),
+                    (["--jobs", ""], []), (["--output-dir", ""], ["music"]), (["a"], ["a song.wav"]),
+                    (["--", "-"], ["-odd.wav"]), (["--force", ""], ["-odd.wav", "a song.wav", "music"])):
+                self.assertEqual(complete(*words, folder=folder), offered, words)
 
 
 if __name__ == "__main__":
