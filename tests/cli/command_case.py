@@ -2,7 +2,6 @@
 import json
 import os
 import pathlib
-import resource
 import struct
 import subprocess
 import tempfile
@@ -16,11 +15,10 @@ _songs = tempfile.TemporaryDirectory()
 
 def song(**options):
     """A song, made once for each set of options. Returns its path."""
-    arguments = [f"--{k.replace('_', '-')}={v}" for k, v in sorted(options.items())]
-    path = pathlib.Path(_songs.name, "".join(arguments) + ".wav")
+    words = [word for k, v in sorted(options.items()) for word in ("--" + k.replace("_", "-"), str(v))]
+    path = pathlib.Path(_songs.name, "".join(words) + ".wav")
     if not path.exists():
-        subprocess.run([MAKE_SONG, path, *" ".join(arguments).replace("=", " ").split()],
-                       check=True, stdout=subprocess.DEVNULL)
+        subprocess.run([MAKE_SONG, path, *words], check=True, stdout=subprocess.DEVNULL)
     return path
 
 
@@ -47,17 +45,14 @@ AS_ORDINARY_USER = [] if os.getuid() != 0 else [
     "setpriv", "--inh-caps=-all", "--bounding-set=-dac_override,-dac_read_search"]
 
 
-def file_limit(size):
-    """Options of a run: no file grows beyond so many bytes."""
-    return {"preexec_fn": lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (size, size))}
+def seconds(text):
+    """h:mm:ss.mmm, m:ss or seconds."""
+    return sum(float(part) * 60 ** i for i, part in enumerate(reversed(text.split(":"))))
 
 
 class Case(unittest.TestCase):
     def setUp(self):
-        folder = tempfile.TemporaryDirectory()
-        self.addCleanup(folder.cleanup)
-        self.folder = pathlib.Path(folder.name)
-        os.chmod(self.folder, 0o755)
+        self.folder = pathlib.Path(self.enterContext(tempfile.TemporaryDirectory()))
 
     def put(self, name, content=None, source=None):
         path = self.folder / name
@@ -75,14 +70,24 @@ class Case(unittest.TestCase):
         """The folder holds these files and nothing else, hidden ones counted."""
         self.assertEqual({p.name for p in self.folder.iterdir()}, set(names))
 
-    def run_tavo(self, *arguments, status=0, before=(), **options):
-        """Runs in the case's folder; arguments may be bytes. Output is bytes."""
-        if "input" not in options:
-            options["stdin"] = subprocess.DEVNULL
-        done = subprocess.run([*before, TAVO, *arguments], capture_output=True, cwd=self.folder, timeout=250,
-                              **options)
-        self.assertEqual(done.returncode, status, (arguments, done.stdout, done.stderr))
+    def run_tavo(self, *arguments, status=0, printed=None, said=b"", before=(), **options):
+        """Runs in the case's folder; arguments may be bytes. printed is all of the standard output, said a part
+        of the messages."""
+        options = {"input": b"", "cwd": self.folder, "timeout": 250, **options}
+        done = subprocess.run([*before, TAVO, *arguments], capture_output=True, **options)
+        told = (arguments, done.stdout, done.stderr)
+        self.assertEqual(done.returncode, status, told)
+        self.assertIn(printed, (None, done.stdout), told)
+        self.assertIn(said, done.stderr, told)
         return done
+
+    def start(self, *arguments, **options):
+        """The command in a session of its own, ended with the test."""
+        options = {**dict.fromkeys(("stdin", "stdout", "stderr"), subprocess.PIPE), **options}
+        process = self.enterContext(subprocess.Popen([TAVO, *arguments], cwd=self.folder, start_new_session=True,
+                                                     **options))
+        self.addCleanup(process.kill)  # runs first
+        return process
 
     def objects(self, text):
         """Each line one JSON object in strict UTF-8, NaN and the like refused."""

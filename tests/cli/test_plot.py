@@ -4,24 +4,19 @@ import re
 import struct
 import xml.etree.ElementTree as ElementTree
 
-from command_case import Case, song, standard_song, wav
+from command_case import Case, seconds, song, standard_song, wav
 
 SVG = "{http://www.w3.org/2000/svg}"
 FULL_SCALE = 32768
 MARKS = {"highlight": {"highlight", "region"}, "beats": {"beats"}, "both": {"highlight", "region", "beats"}}
 
 
-def seconds(label):
-    return sum(float(part) * 60 ** i for i, part in enumerate(reversed(label.split(":"))))
-
-
 class Picture:
     def __init__(self, path):
-        self.root = ElementTree.fromstring(path.read_bytes())
+        self.root = ElementTree.parse(path).getroot()
         assert self.root.tag == SVG + "svg", self.root.tag
         self.named = {e.get("id"): e for e in self.root.iter() if e.get("id")}
         self.texts = [e.text for e in self.root.iter(SVG + "text")]
-        self.title = self.root.find(SVG + "title").text
         self.times = [(float(e.get("x")), seconds(e.text)) for e in self.named["times"]]
 
     def x_of(self, ms):
@@ -32,12 +27,8 @@ class Picture:
     def number(self, name, attribute):
         return float(self.named[name].get(attribute))
 
-    def ticks(self):
-        return [float(x) for x in re.findall(r"M(-?[\d.]+) ", self.named["beats"].get("d"))]
-
-    def points(self, name):
-        return [(float(x), float(y))
-                for x, y in re.findall(r"[ML]([-\d.]+) ([-\d.]+)", self.named[name].get("d"))]
+    def points(self, name, pattern=r"[ML]([-\d.]+) ([-\d.]+)"):
+        return [(float(x), float(y)) for x, y in re.findall(pattern, self.named[name].get("d"))]
 
 
 class Plot(Case):
@@ -45,37 +36,34 @@ class Plot(Case):
         (result,) = self.run_json("--plot", "out.svg", "--force", *arguments, name)
         return result, Picture(self.folder / "out.svg")
 
-    def assert_ticks(self, result, picture, delta):
-        self.assertEqual(len(picture.ticks()), result["beat_count"])
-        for x, ms in zip(picture.ticks(), result["beats_ms"]):
+    def assert_at(self, picture, places, times_ms, delta=1):
+        self.assertEqual(len(places), len(times_ms))
+        for x, ms in zip(places, times_ms):
             self.assertAlmostEqual(x, picture.x_of(ms), delta=delta)
 
     def test_marks_stand_where_the_results_say(self):
         self.put("song.wav", source=standard_song())
-        for mode in ("highlight", "beats", "both"):
+        for mode, marks in MARKS.items():
             result, picture = self.draw("song.wav", "--mode", mode, "--length", "12")
             words = " ".join(picture.texts)
-            self.assertEqual(picture.named.keys() & MARKS["both"], MARKS[mode])
-            self.assertEqual("BPM" in words, mode != "highlight")
+            self.assertEqual(picture.named.keys() & MARKS["both"], marks)
+            self.assertEqual(("BPM" in words, "highlight 0:" in words), (mode != "highlight", mode != "beats"))
             if mode != "highlight":
-                self.assert_ticks(result, picture, delta=1)
+                self.assert_at(picture, [x for x, _ in picture.points("beats")], result["beats_ms"])
                 label = "beats from the highlight on" if mode == "both" else "beats"
                 self.assertIn(f"{result['beat_count']} {label}, {result['bpm']} BPM", picture.texts)
             if mode != "beats":
-                start, end = (picture.x_of(result[key]) for key in ("hl_pos_ms", "hl_end_ms"))
-                for name, attribute in (("highlight", "x1"), ("highlight", "x2"), ("region", "x")):
-                    self.assertAlmostEqual(picture.number(name, attribute), start, delta=1)
-                self.assertAlmostEqual(picture.number("region", "width"), end - start, delta=2)
-                self.assertIn("highlight 0:", words)
+                left = picture.number("region", "x")
+                edges = [picture.number("highlight", "x1"), picture.number("highlight", "x2"), left]
+                self.assert_at(picture, edges, 3 * [result["hl_pos_ms"]])
+                self.assert_at(picture, [left + picture.number("region", "width")], [result["hl_end_ms"]])
         self.assertNotIn("region", self.draw("song.wav", "--mode", "highlight")[1].named)
 
     def test_the_sound(self):
         # 10 s: half a full-scale square wave (mean square 1/4) from 4 s on, silence before.
         rate, level = 8000, FULL_SCALE // 2
-        loud = b"".join(struct.pack("<h", level if i // 40 % 2 else -level)
-                        for i in range(6 * rate))
-        whole = wav(seconds=10, rate=rate)
-        self.put("steps.wav", whole[:44] + bytes(2 * 4 * rate) + loud)
+        loud = b"".join(struct.pack("<h", level if i // 40 % 2 else -level) for i in range(6 * rate))
+        self.put("steps.wav", wav(seconds=10, rate=rate)[:44] + bytes(2 * 4 * rate) + loud)
         _, picture = self.draw("steps.wav", "--mode", "highlight")
         points = picture.points("waveform")
         middle = (min(y for _, y in points) + max(y for _, y in points)) / 2
@@ -85,34 +73,25 @@ class Plot(Case):
                 self.assertAlmostEqual(y, middle, delta=0.2)
             elif x > edge + 1.5:
                 self.assertGreater(abs(y - middle), 20)
-        self.assertIn("waveform, peak 50 %", picture.texts)
         # Windows of 6 s at 0, 2 and 4 s, drawn at their middles: 2, 4 and 6 s of sound in each.
         curve = picture.points("loudness")
-        self.assertEqual(len(curve), 3)
-        for (x, _), ms in zip(curve, (3000, 5000, 7000)):
-            self.assertAlmostEqual(x, picture.x_of(ms), delta=1)
-        self.assertEqual([y for _, y in curve], sorted((y for _, y in curve), reverse=True))
+        self.assert_at(picture, [x for x, _ in curve], (3000, 5000, 7000))
+        heights = [y for _, y in curve]
+        self.assertEqual(heights, sorted(heights, reverse=True))
         # 10 log10(1 + part / 4) for a third, two thirds and the whole: 0.348, 0.669, 0.969. The
         # greatest stands for a mean square of 1/4, -6.0 dB, the mean (0.662) for 0.165, -7.8 dB.
-        self.assertIn("-6.0 dB", picture.texts)
-        self.assertIn("loudness, mean -7.8 dB", picture.texts)
-        self.assertIn("silence", picture.texts)
-        self.assertAlmostEqual(picture.number("mean", "y1"), sum(y for _, y in curve) / 3,
-                               delta=0.5)
+        for words in ("waveform, peak 50 %", "-6.0 dB", "loudness, mean -7.8 dB", "silence"):
+            self.assertIn(words, picture.texts)
+        self.assertAlmostEqual(picture.number("mean", "y1"), sum(heights) / 3, delta=0.5)
 
     def test_margins_that_are_not_searched_are_shaded(self):
         # (length, shaded): values every 2 s over 6 s, rises from value 9 (in songs under 90 s: 0) to
         # value n - 25 (n - 10), and to the end of the window there.
-        for length, shaded in ((60, [(0, 0), (42, 60)]), (100, [(0, 18), (52, 100)]),
-                               (20, [(0, 0), (0, 20)])):
-            with self.subTest(length=length):
-                self.put("song.wav", source=song(seconds=length, bpm=120, rate=8000, channels=1))
-                _, picture = self.draw("song.wav", "--mode", "highlight")
-                boxes = re.findall(r"M([\d.]+) [\d.]+H([\d.]+)", picture.named["unsearched"].get("d"))
-                self.assertEqual(len(boxes), 2)
-                for box, (start, end) in zip(boxes, shaded):
-                    self.assertAlmostEqual(float(box[0]), picture.x_of(1000 * start), delta=1)
-                    self.assertAlmostEqual(float(box[1]), picture.x_of(1000 * end), delta=1)
+        for length, shaded in ((60, (0, 0, 42, 60)), (100, (0, 18, 52, 100)), (20, (0, 0, 0, 20))):
+            self.put("song.wav", source=song(seconds=length, bpm=120, rate=8000, channels=1))
+            _, picture = self.draw("song.wav", "--mode", "highlight")
+            boxes = picture.points("unsearched", r"M([\d.]+) [\d.]+H([\d.]+)")
+            self.assert_at(picture, [x for box in boxes for x in box], [1000 * s for s in shaded])
         self.assertNotIn("unsearched", self.draw("song.wav", "--mode", "beats")[1].named)
 
     def test_readable_when_small_on_a_dark_ground_and_at_any_length(self):
@@ -134,17 +113,18 @@ class Plot(Case):
     def test_a_crowd_of_beats_is_stacked(self):
         self.put("crowd.wav", source=song(seconds=1500, bpm=120, rate=8000, channels=1))
         result, picture = self.draw("crowd.wav", "--mode", "beats")
-        self.assertGreater(result["beat_count"], 500)
-        self.assertLess(len(set(picture.ticks())), result["beat_count"])
-        self.assert_ticks(result, picture, delta=3.1)  # the middle of 6
+        ticks = [x for x, _ in picture.points("beats")]
+        self.assertGreater(len(ticks), 500)
+        self.assertLess(len(set(ticks)), len(ticks))
+        self.assert_at(picture, ticks, result["beats_ms"], delta=3.1)  # the middle of 6
 
     def test_names(self):
         for name, title in ((b"a<b>&\"c\"' ]]>.wav", "a<b>&\"c\"' ]]>.wav"),
                             (b"tab\tcaf\xc3\xa9 \xff\xef\xbf\xbf.wav", "tab\ufffdcaf\u00e9 \ufffd\ufffd.wav"),
                             (b"w" * 250 + b".wav", "w" * 250 + ".wav")):
-            os.replace(self.put("plain.wav"), os.path.join(os.fsencode(self.folder), name))
+            self.put(os.fsdecode(name))
             _, picture = self.draw(name)
-            self.assertEqual(picture.title, title)
+            self.assertEqual(picture.root.find(SVG + "title").text, title)
             shown = picture.texts[0]
             self.assertTrue(shown == title or (shown[:45] == title[:45] and shown[-1] == "\u2026"))
             self.assertLess(len(shown), 60)

@@ -6,10 +6,11 @@ import re
 import select
 import signal
 import subprocess
+import threading
 import time
 from pathlib import Path
 
-from command_case import TAVO, Case, short_song, song, wav
+from command_case import Case, short_song, song, wav
 
 
 def open_files(pid):
@@ -28,25 +29,25 @@ class Workers(Case):
         os.link(self.folder / "long.wav", self.folder / "other.wav")
 
     def start(self, *arguments, form="json", **options):
-        options = {"stdout": subprocess.PIPE, "stderr": subprocess.PIPE, **options}
-        process = subprocess.Popen([TAVO, "--format", form, *arguments], cwd=self.folder,
-                                   start_new_session=True, **options)
-        for stream in (process.stdin, process.stdout, process.stderr):
-            self.addCleanup(stream.close if stream else lambda: None)
-        self.addCleanup(process.wait)
-        self.addCleanup(process.kill)  # runs first
-        return process
+        return super().start("--format", form, *arguments, **options)
 
-    def worker_with(self, process, name):
-        """Waits until a worker has the file open. Returns its pid."""
+    def wait_until(self, condition):
+        """Returns what the condition gives once that is true."""
         end = time.monotonic() + 60
         while time.monotonic() < end:
+            if found := condition():
+                return found
+            time.sleep(0.02)
+        self.fail("it did not happen within a minute")
+
+    def worker_with(self, process, name):
+        """The pid of the worker that has the file open, waited for."""
+        def find():
             self.assertIsNone(process.poll(), "the command ended before its time")
             children = Path(f"/proc/{process.pid}/task/{process.pid}/children").read_text()
-            for child in map(int, children.split()):
-                if str(self.folder / name) in dict(open_files(child)).values():
-                    return child
-        self.fail("no worker opened " + name)
+            return [child for child in map(int, children.split())
+                    if str(self.folder / name) in dict(open_files(child)).values()]
+        return self.wait_until(find)[0]
 
     def assert_results(self, text, *expected):
         self.assertEqual([(r["file"], r["status"]) for r in self.objects(text)], [*expected])
@@ -78,75 +79,75 @@ class Workers(Case):
         pipes = [{to for fd, to in open_files(pid) if fd > 2 and to.startswith("pipe:")} for pid in workers]
         self.assertTrue(all(pipes))
         self.assertEqual(pipes[0] & pipes[1], set())
+        ends = [os.fdopen(os.pidfd_open(pid)) for pid in workers]
         process.kill()
-        end = time.monotonic() + 60
-        for worker in (Path(f"/proc/{pid}") for pid in workers):
-            # Ended, a worker is nobody's to reap here.
-            while worker.exists() and (worker / "stat").read_text().split()[2] != "Z":
-                self.assertLess(time.monotonic(), end, "the worker goes on")
-                time.sleep(0.05)
+        for end in ends:
+            with end:
+                self.assertTrue(select.select([end], [], [], 60)[0], "the worker goes on")
 
     def test_a_stop_keeps_what_is_finished(self):
         # As kill does, as the terminal does; results that wait behind the file that is stopped.
-        for send, number, arguments, busy, finished in (
-                (os.kill, signal.SIGTERM, ["a.wav", "long.wav", "./a.wav"], "long.wav", ["a.wav"]),
-                (os.killpg, signal.SIGINT, ["a.wav", "long.wav", "./a.wav"], "long.wav", ["a.wav"]),
-                (os.kill, signal.SIGINT, ["-j", "2", "long.wav", "a.wav", "./a.wav", "other.wav"],
-                 "other.wav", ["a.wav", "./a.wav"])):
-            with self.subTest(send=send, number=number, arguments=arguments):
-                process = self.start(*arguments)
+        for send, number, words, busy, finished in (
+                (os.kill, signal.SIGTERM, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
+                (os.killpg, signal.SIGINT, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
+                (os.kill, signal.SIGINT, "-j 2 long.wav a.wav ./a.wav other.wav", "other.wav", ["a.wav", "./a.wav"]),
+                (os.kill, signal.SIGINT, "--plot p.svg long.wav", "long.wav", [])):
+            with self.subTest(words=words, send=send):
+                process = self.start(*words.split())
                 worker = self.worker_with(process, busy)
                 send(process.pid, number)
                 out, err = process.communicate(timeout=120)
                 self.assertFalse(os.path.exists(f"/proc/{worker}"))
                 self.assertEqual(process.returncode, 128 + number, err)
                 self.assert_results(out, *((name, "ok") for name in finished))
-                self.assertRegex(err, rb"stopped; %d of [34] files done" % len(finished))
-        process = self.start("-", stdin=subprocess.PIPE)  # a list that is being read
-        time.sleep(0.5)
-        process.send_signal(signal.SIGINT)
-        self.assertEqual(process.wait(timeout=60), 130)
+                self.assertRegex(err, rb"stopped; %d of [134] files? done" % len(finished))
+        self.assert_only("a.wav", "long.wav", "other.wav")
+
+    def test_a_list_that_is_being_read(self):
+        """A stop and a reader gone end the wait for the next name."""
+        for end, status in ((lambda process: process.send_signal(signal.SIGINT), 128 + signal.SIGINT),
+                            (lambda process: process.stdout.close(), 128 + signal.SIGPIPE)):
+            process = self.start("-")
+            process.stdin.write(b"a.wav\n")
+            process.stdin.flush()
+            self.assert_results(process.stdout.readline(), ("a.wav", "ok"))
+            end(process)
+            self.assertEqual(process.wait(timeout=60), status)
 
     def test_a_reader_gone(self):
         """The work ends, without a word, with the status of a broken pipe."""
-        process = self.start(*["long.wav"] * 400)
-        self.worker_with(process, "long.wav")
-        process.stdout.close()
-        # One of these takes seconds, all of them minutes.
-        self.assertEqual(process.wait(timeout=60), 128 + signal.SIGPIPE)
-        self.assertEqual(process.stderr.read(), b"")
-        reader, writer = os.pipe()  # gone before the first byte
-        os.close(reader)
-        process = self.start("a.wav", form="csv", stdout=writer)  # which has a head
-        os.close(writer)
-        _, err = process.communicate(timeout=120)
-        self.assertEqual((process.returncode, err), (128 + signal.SIGPIPE, b""))
+        for words, form in ((["long.wav"] * 400, "json"), (["a.wav"], "csv")):  # a head comes before the first result
+            reader, writer = os.pipe()
+            process = self.start(*words, form=form, stdout=writer)
+            os.close(writer)
+            os.close(reader)
+            _, err = process.communicate(timeout=60)  # all 400 take minutes
+            self.assertEqual((process.returncode, err), (128 + signal.SIGPIPE, b""))
 
     def on_terminal(self, *arguments, enough):
         """What standard error shows on a terminal: until it is enough, then after Ctrl-C."""
-        try:
-            control, terminal = pty.openpty()
-        except OSError:
-            self.skipTest("this system has no terminals")
-        process = self.start("-m", "highlight", *arguments, *["long.wav"] * 400,
-                             stdout=subprocess.DEVNULL, stderr=terminal)
+        control, terminal = pty.openpty()
+        process = self.start("-m", "highlight", *arguments, *["long.wav"] * 400, stdout=subprocess.DEVNULL,
+                             stderr=terminal)
         os.close(terminal)
-        started = time.monotonic()
-        shown = b""
-        while not enough(shown, time.monotonic() - started):
-            if select.select([control], [], [], 0.1)[0]:
-                shown += os.read(control, 65536)
+        shown = []
+
+        def read():
+            with open(control, "rb", buffering=0) as stream, contextlib.suppress(OSError):  # the command has gone
+                while part := stream.read(65536):
+                    shown.append(part)
+        reader = threading.Thread(target=read)
+        reader.start()
+        self.wait_until(lambda: enough(b"".join(shown)))
         process.send_signal(signal.SIGINT)
-        with contextlib.suppress(OSError):  # the terminal's other side is closed
-            while part := os.read(control, 65536):
-                shown += part
-        os.close(control)
-        return shown
+        reader.join()
+        return b"".join(shown)
 
     def test_progress_on_a_terminal_only(self):
         bar = rb"\r\[[#-]+\] (\d+)/400 files, \d+\.\d a minute, \d+:\d\d left"
-        shown = self.on_terminal(enough=lambda text, _: len(set(re.findall(bar, text))) > 1)
+        shown = self.on_terminal(enough=lambda text: len(set(re.findall(bar, text))) > 1)
         self.assertRegex(shown, rb"left.*\r\x1b\[Ktavo: stopped; \d+ of 400 files done\.\r\n$")
-        shown = self.on_terminal("--quiet", enough=lambda _, seconds: seconds > 2)
+        end = time.monotonic() + 2
+        shown = self.on_terminal("--quiet", enough=lambda _: time.monotonic() > end)
         self.assertRegex(shown, rb"^tavo: stopped[^\r]*\r\n$")
         self.assertEqual(self.run_tavo("-m", "highlight", *["long.wav"] * 8).stderr, b"")
