@@ -147,7 +147,7 @@ class Results(Case):
             self.run_tavo(*words.split(), "song.wav", said=said)
             self.assertEqual(self.run_tavo(*words.split(), "-q", "song.wav").stderr, b"")
         for words, said in (("--help >/dev/full", b"No space left"), ("song.wav >/dev/full", b"cannot be written"),
-                            ("song.wav >&-", b"cannot be written")):
+                            ("song.wav <&- >&-", b"cannot be written")):
             done = subprocess.run(f"'{TAVO}' {words}", shell=True, cwd=self.folder, capture_output=True)
             self.assertEqual(done.returncode, 1, words)
             self.assertIn(said, done.stderr)
