@@ -55,12 +55,17 @@ void run_one(void (*const (&functions)[count])(input *), const uint8_t *data, si
     functions[in.ConsumeIntegralInRange<size_t>(0, count - 1)](&in);
 }
 
-// A file of these bytes; its path. The one before is gone.
-inline std::string file_of(const std::vector<uint8_t> &bytes) {
-    static const int fd = memfd_create("input", MFD_CLOEXEC);
+// Makes these bytes a file's contents.
+inline void fill(int fd, const std::vector<uint8_t> &bytes) {
     must(ftruncate(fd, 0) == 0, "a file is emptied");
     must(pwrite(fd, bytes.data(), bytes.size(), 0) == static_cast<ssize_t>(bytes.size()),
          "a file is written");
+}
+
+// A file of these bytes; its path. The one before is gone.
+inline std::string file_of(const std::vector<uint8_t> &bytes) {
+    static const int fd = memfd_create("input", MFD_CLOEXEC);
+    fill(fd, bytes);
     return "/proc/self/fd/" + std::to_string(fd);
 }
 

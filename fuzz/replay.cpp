@@ -1,7 +1,8 @@
 // replay RUNS DIR...: gives a fuzzer's function every file in DIRs, then RUNS inputs made of their
 // pieces and of random bytes, the same ones each time. For compilers without libFuzzer, and for
-// every test run. The input of a failure is left in fuzz_last_input.
-#include <csignal>
+// every test run. The input of a failure is left beside the program, in a file that ends in .last.
+#include <fcntl.h>
+
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -19,47 +20,29 @@ size_t below(size_t limit) {
     return limit == 0 ? 0 : random_numbers() % limit;
 }
 
-// A kept input with some bytes changed and random choices at its end, or random bytes alone.
+// A kept input with some bytes changed, half of the time near its start, and random choices at its
+// end; or random bytes alone.
 bytes next_input(const std::vector<bytes> &kept) {
-    bytes input = below(2) == 0 ? kept[below(kept.size())] : bytes(below(2000));
-    const size_t changed = input.empty() || below(4) == 0 ? 0 : below(16);
-    for (size_t i = 0; i < changed; ++i)
-        input[below(input.size())] = static_cast<uint8_t>(random_numbers());
-    const size_t tail = std::min(input.size(), 1 + below(64));
-    const bool all =
-        std::all_of(input.begin(), input.end(), [](uint8_t byte) { return byte == 0; });
-    const auto from = all ? input.begin() : input.end() - static_cast<ptrdiff_t>(tail);
-    std::generate(from, input.end(), [] { return static_cast<uint8_t>(random_numbers()); });
+    const auto random_byte = [] { return static_cast<uint8_t>(random_numbers()); };
+    const bool made_up = below(2) == 0;
+    bytes input = made_up ? bytes(below(2000)) : kept[below(kept.size())];
+    const size_t reach = below(2) == 0 ? std::min<size_t>(input.size(), 256) : input.size();
+    for (size_t i = reach > 0 ? below(16) : 0; i > 0; --i) input[below(reach)] = random_byte();
+    const size_t tail = std::min(input.size(), made_up ? SIZE_MAX : 1 + below(64));
+    std::generate(input.end() - static_cast<ptrdiff_t>(tail), input.end(), random_byte);
     return input;
 }
 
-bytes last;
-
-void keep_last() {
-    std::ofstream("fuzz_last_input", std::ios::binary)
-        .write(reinterpret_cast<const char *>(last.data()),
-               static_cast<std::streamsize>(last.size()));
-}
-
-void stop(int number) {
-    keep_last();
-    signal(number, SIG_DFL);
-    raise(number);
-}
-
-void run(bytes input) {
-    last = std::move(input);
-    LLVMFuzzerTestOneInput(last.data(), last.size());
+void run(int last, const bytes &input) {
+    fuzz::fill(last, input);
+    LLVMFuzzerTestOneInput(input.data(), input.size());
 }
 
 }  // namespace
 
-extern "C" void __sanitizer_set_death_callback(void (*callback)()) __attribute__((weak));
-
 int main(int argc, char **argv) {
     if (argc < 3) return 2;
-    if (__sanitizer_set_death_callback != nullptr) __sanitizer_set_death_callback(keep_last);
-    for (const int number : {SIGABRT, SIGSEGV}) signal(number, stop);
+    const int last = creat((std::string(argv[0]) + ".last").c_str(), 0644);
     std::vector<std::filesystem::path> paths;
     for (int i = 2; i < argc; ++i) {
         for (const auto &entry : std::filesystem::directory_iterator(argv[i]))
@@ -70,10 +53,10 @@ int main(int argc, char **argv) {
     for (const auto &path : paths) {
         std::ifstream in(path, std::ios::binary);
         kept.emplace_back(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-        run(kept.back());
+        run(last, kept.back());
     }
     fuzz::must(!kept.empty(), "there are kept inputs");
-    for (long i = 0; i < atol(argv[1]); ++i) run(next_input(kept));
+    for (long i = 0; i < atol(argv[1]); ++i) run(last, next_input(kept));
     printf("%zu kept inputs, %s made ones\n", kept.size(), argv[1]);
     return 0;
 }

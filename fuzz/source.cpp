@@ -82,45 +82,34 @@ void operate(stream *of, fuzz::input *in) {
     constexpr int32_t kOddWants[] = {-1,          0,         1,        3, kQueueBytes / 8,
                                      kQueueBytes, INT32_MAX, INT32_MIN};
     std::vector<uint8_t> ignored;
-    switch (in->ConsumeIntegralInRange(0, 4)) {
-        case 0:
-            read(of, in->PickValueInArray(kOddWants), &ignored);
-            break;
-        case 1:
-            read(of, in->ConsumeIntegralInRange(1, 8192), &ignored);
-            break;
-        case 2:
-            must(mtsrc_reset(of->src) == -5, "a reset is done");
-            of->at = kUnknownPlace;
-            break;
-        default:
-            read_twice(of, in);
-    }
+    const int operation = in->ConsumeIntegralInRange(0, 4);
+    if (operation == 0) read(of, in->PickValueInArray(kOddWants), &ignored);
+    if (operation == 1) read(of, in->ConsumeIntegralInRange(1, 8192), &ignored);
+    if (operation == 2) must(mtsrc_reset(of->src) == -5, "a reset is done");
+    if (operation == 2) of->at = kUnknownPlace;
+    if (operation > 2) read_twice(of, in);
 }
 
 }  // namespace
 
 int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    constexpr size_t kChoices =
-        64;  // bytes at the end, read twice: as choices, and as part of the file
+    // Bytes at the end are read twice: as choices, and as part of the file.
+    constexpr size_t kChoices = 64;
     fuzz::input in(data + size - std::min(size, kChoices), std::min(size, kChoices));
     const std::string path = fuzz::file_of({data, data + size});
     const mtsrc_param param = {path.c_str()};
     int32_t err = INT32_MIN;
     stream of;
     of.src = mtsrc_init(&param, &err);
-    if (of.src == nullptr) {
-        must(err == -2 || err == -3 || err == -6 || err == -7 || err == -255,
-             "an open fails as it may");
-    } else {
-        must(err == 0 && mtsrc_getstream_format(of.src, &of.format) == 0,
-             "an open source has a format");
-        must(of.format.bits == 16 && of.format.channels > 0, "a format is whole");
-        must(of.format.sample_rate > 0 && of.format.sample_rate <= 192'000, "a rate is usable");
-        must(of.format.duration >= 0, "a duration is none or some");
-        of.total = bytes_at(of, of.format.duration);
-        for (int i = in.ConsumeIntegralInRange(1, 5); i > 0; --i) operate(&of, &in);
-        must(mtsrc_deinit(of.src) == -5, "a release is done");
-    }
+    const bool is_code = err == -2 || err == -3 || err == -6 || err == -7 || err == -255;
+    must(of.src == nullptr ? is_code : err == 0, "an open fails as it may");
+    if (of.src == nullptr) return 0;
+    must(mtsrc_getstream_format(of.src, &of.format) == 0, "an open source has a format");
+    must(of.format.bits == 16 && of.format.channels > 0, "a format is whole");
+    must(of.format.sample_rate > 0 && of.format.sample_rate <= 192'000, "a rate is usable");
+    must(of.format.duration >= 0, "a duration is none or some");
+    of.total = bytes_at(of, of.format.duration);
+    for (int i = in.ConsumeIntegralInRange(1, 5); i > 0; --i) operate(&of, &in);
+    must(mtsrc_deinit(of.src) == -5, "a release is done");
     return 0;
 }

@@ -4,6 +4,7 @@
 
 #include <cerrno>
 #include <memory>
+#include <numeric>
 
 #include "beat/beat_ctx.h"
 #include "beat/candidates.h"
@@ -41,49 +42,44 @@ int32_t take_rate(fuzz::input *in) {
                                                      33075, 44100, 44099, 48000, 88200, 96000});
 }
 
-void interpolate(fuzz::input *in) {
-    const auto state = std::make_unique<dorn_resampler_state>();
-    const int32_t source = take_rate(in);
-    const int32_t target = in->ConsumeBool() ? kAnalysisRate : take_rate(in);
-    const int32_t channels = in->ConsumeIntegralInRange(1, 3);
-    const std::vector<int16_t> pcm = take_pcm(in, 2000);
-    if (pcm.empty() || static_cast<int64_t>(pcm.size()) * target / source > 8000) return;
-    must(dorn_resampler_prepare(state.get(), source, target, channels) == 0, "rates are prepared");
-    std::vector<int16_t> wanted;
-    const int64_t code = reference::convert(*state, pcm, &wanted);
-    std::vector<int16_t> out(std::max<size_t>(wanted.size(), 1));
-    must(dorn_resampler_convert(state.get(), pcm.data(), static_cast<int32_t>(pcm.size()),
-                                out.data()) == code,
-         "a conversion ends where it does");
-    must(std::equal(wanted.begin(), wanted.end(), out.begin()), "a conversion is its sums");
-}
-
-// A whole conversion: the interpolator's samples, or the means of blocks.
+// The interpolator alone, which takes several channels, and a whole conversion: its samples, or the
+// means of blocks, and cleared bytes.
 void convert(fuzz::input *in) {
-    const int32_t source =
-        in->ConsumeBool() ? kAnalysisRate * in->ConsumeIntegralInRange(1, 4) : take_rate(in);
-    const bool odd = in->ConsumeBool();
+    const auto state = std::make_unique<dorn_resampler_state>();
+    const int32_t target = in->ConsumeBool() ? kAnalysisRate : take_rate(in);
+    const bool whole = in->ConsumeBool();
+    const int32_t source = whole ? target * in->ConsumeIntegralInRange(1, 8) : take_rate(in);
+    const int32_t channels = in->ConsumeIntegralInRange(1, 3);
+    const bool odd = in->ConsumeBool();  // one byte more
     const std::vector<int16_t> pcm = take_pcm(in, 2000);
-    const auto samples = static_cast<int64_t>(pcm.size()) - (odd && !pcm.empty() ? 1 : 0);
-    const int64_t bytes = 2 * samples + (odd && !pcm.empty() ? 1 : 0);
-    const int64_t expected = bytes / 2 * kAnalysisRate / source;
-    if (expected > 8000) return;
-    int64_t length = -1;
-    double *out = nullptr;
-    must(dorn_resampler_run(pcm.data(), bytes, source, kAnalysisRate, &length, &out) == 0 &&
-             length == expected,
-         "a conversion has its length");
-    const int32_t block = source % kAnalysisRate == 0 ? source / kAnalysisRate : 0;
-    for (int64_t i = 0; i < length + 8; ++i) {
-        float sum = 0.0f;
-        for (int32_t k = 0; k < block && i < length; ++k)
-            sum += pcm[static_cast<size_t>(i * block + k)];
-        must(block >= 1 && block <= 4
-                 ? out[i] == static_cast<double>(sum / static_cast<float>(block))
-                 : std::fabs(out[i]) <= (i < length ? 32'768.0 : 0.0),
-             "blocks are averaged, samples have 16 bits, cleared bytes follow");
+    const auto count = static_cast<int64_t>(pcm.size());
+    if (pcm.empty() || count * target / source > 8000) return;
+    must(dorn_resampler_prepare(state.get(), source, target, channels) == 0, "rates are prepared");
+    std::vector<int16_t> samples;
+    const int64_t code = reference::convert(*state, pcm, &samples);
+    std::vector<int16_t> out(std::max<size_t>(samples.size(), 1));
+    must(dorn_resampler_convert(state.get(), pcm.data(), static_cast<int32_t>(count), out.data()) ==
+             code,
+         "a conversion ends where it does");
+    must(std::equal(samples.begin(), samples.end(), out.begin()), "a conversion is its sums");
+    if (channels > 1) return;
+
+    const auto length = static_cast<size_t>(count * target / source);
+    std::vector<double> wanted(samples.begin(), samples.end());
+    wanted.resize(length);
+    const auto block = static_cast<size_t>(source % target == 0 ? source / target : 0);
+    for (size_t i = 0; block >= 1 && block <= 4 && i < length; ++i) {
+        const float sum = std::accumulate(&pcm[i * block], &pcm[i * block] + block, 0.0f);
+        wanted[i] = static_cast<double>(sum / static_cast<float>(block));
     }
-    free(out);
+    wanted.resize(length + 8);
+    int64_t found = -1;
+    double *all = nullptr;
+    must(dorn_resampler_run(pcm.data(), 2 * count + odd, source, target, &found, &all) == 0 &&
+             found == static_cast<int64_t>(length),
+         "a conversion has its length");
+    must(std::equal(wanted.begin(), wanted.end(), all), "a conversion is its samples and zeros");
+    free(all);
 }
 
 // --- 7: the highlight
@@ -136,21 +132,6 @@ void search_curve(fuzz::input *in) {
 
 // --- 4 to 6: beats
 
-struct analysis {
-    TAVO_CTX ctx = {};
-    TAVO_ONSET_CTX onset = {};
-    TAVO_BEAT_CTX beat = {};
-    explicit analysis(std::vector<double> *signal) {
-        onset.frame_size = kFrameSize;
-        onset.hop_size = kHopSize;
-        ctx.onset = &onset;
-        ctx.ana = signal->data();
-        ctx.ana_len = static_cast<int64_t>(signal->size());
-        ctx.ana_rate = kAnalysisRate;
-        fnamedec = "";
-    }
-};
-
 // From an envelope on: tempo, threshold, candidates, gaps. Values repeat.
 void place_beats(fuzz::input *in) {
     const int32_t limit = in->ConsumeIntegralInRange(-2, 40);
@@ -162,9 +143,16 @@ void place_beats(fuzz::input *in) {
     const size_t frames = 1 + std::min<size_t>(part.size() * repeats, 1200);
 
     std::vector<double> silence(kHopSize * (frames - 1) + kFrameSize);
-    analysis run(&silence);
-    __beat_init(&run.ctx, &run.beat);
-    TAVO_BEAT_CTX *beat = &run.beat;
+    TAVO_CTX ctx = {};
+    TAVO_ONSET_CTX onset = {};
+    TAVO_BEAT_CTX of = {}, *beat = &of;
+    onset.frame_size = kFrameSize;
+    onset.hop_size = kHopSize;
+    ctx.onset = &onset;
+    ctx.ana = silence.data();
+    ctx.ana_len = static_cast<int64_t>(silence.size());
+    ctx.ana_rate = kAnalysisRate;
+    __beat_init(&ctx, beat);
     must(beat->signal != nullptr && beat->frame_count == static_cast<int64_t>(frames),
          "a context is made");
     std::vector<double> env(frames);
@@ -179,16 +167,16 @@ void place_beats(fuzz::input *in) {
 
     const int32_t bpm = estimate_tempo(beat);
     must(bpm >= 30 && bpm <= 200, "a tempo is 30 to 200");
-    run.onset.max_beats = limit;
-    run.onset.bpm = free_tempo != 0 ? free_tempo : bpm;
+    onset.max_beats = limit;
+    onset.bpm = free_tempo != 0 ? free_tempo : bpm;
     std::vector<float> out(static_cast<size_t>(candidate_room(beat)));
-    const int32_t count = getBeatCandi_MT(beat, &run.onset, out.data());
+    const int32_t count = getBeatCandi_MT(beat, &onset, out.data());
     must(count >= 0 && (limit < 1 || count <= limit + kMaxAddedBeats), "beats are limited");
     must(std::is_sorted(out.begin(), out.begin() + count), "beats ascend");
     const float last = 1000.0f * beat->frame_times[0] * static_cast<float>(frames + 1);
     must(count == 0 || (out[0] > 0.0f && out[static_cast<size_t>(count) - 1] <= last),
          "beats lie in the song");
-    const double four_beats = std::trunc(4.0 * 60.0 / run.onset.bpm);
+    const double four_beats = std::trunc(4.0 * 60.0 / onset.bpm);
     const auto window = static_cast<int64_t>(static_cast<float>(four_beats) / beat->frame_times[0]);
     const auto curve = reference::threshold(env, window + window % 2);
     must(std::equal(curve.begin(), curve.end(), beat->threshold),
@@ -199,6 +187,6 @@ void place_beats(fuzz::input *in) {
 }  // namespace
 
 int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    fuzz::run_one({interpolate, convert, select_region, search_curve, place_beats}, data, size);
+    fuzz::run_one({convert, select_region, search_curve, place_beats}, data, size);
     return 0;
 }

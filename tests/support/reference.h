@@ -11,32 +11,6 @@
 
 namespace reference {
 
-struct complex_signal {
-    std::vector<double> re, im;
-};
-
-// The first outputs values of the transform of the first inputs values; the rest is 0. sign: -1
-// forward, 1 inverse, which divides by the length. real: imaginary inputs count as 0.
-inline complex_signal transform(const complex_signal &x, int inputs, int outputs, bool real,
-                                double sign) {
-    constexpr double kTwoPi = 6.283185307179586;
-    const auto n = static_cast<int>(x.re.size());
-    complex_signal y = {std::vector<double>(x.re.size()), std::vector<double>(x.re.size())};
-    for (int k = 0; k < std::min(outputs, n); ++k) {
-        double re = 0.0, im = 0.0;
-        for (int j = 0; j < std::min(inputs, n); ++j) {
-            const auto at = static_cast<size_t>(j);
-            const double angle = sign * kTwoPi * (j * k % n) / n;
-            const double imaginary = real ? 0.0 : x.im[at];
-            re += x.re[at] * std::cos(angle) - imaginary * std::sin(angle);
-            im += x.re[at] * std::sin(angle) + imaginary * std::cos(angle);
-        }
-        y.re[static_cast<size_t>(k)] = sign > 0.0 ? re / n : re;
-        y.im[static_cast<size_t>(k)] = sign > 0.0 ? im / n : im;
-    }
-    return y;
-}
-
 // The windowed-sinc converter. Returns the samples written to out, -1 for a phase out of range.
 inline int64_t convert(const dorn_resampler_state &s, const std::vector<int16_t> &in,
                        std::vector<int16_t> *out) {
