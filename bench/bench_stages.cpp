@@ -26,13 +26,14 @@ constexpr int32_t kSecondMinute = 2583;  // its first hop in a song of two minut
 constexpr int32_t kTempoTransform = 4096;
 constexpr int32_t kTempoLags = 86;
 
-std::vector<int16_t> left_channel(int32_t rate) {
+std::vector<int16_t> mono_song(int32_t rate) {
     support::song_spec plan;
     plan.seconds = 180.0;
+    plan.channels = 1;
     plan.rate = rate;
     plan.loud_at = 60.0;
     plan.tail_at = 150.0;
-    return support::channel_of(support::make_song(plan), 0);
+    return support::make_song(plan).pcm;
 }
 
 const std::string &song_file() {
@@ -61,7 +62,7 @@ void open_and_decode(benchmark::State &state) {
 
 void convert(benchmark::State &state) {
     const auto rate = static_cast<int32_t>(state.range(0));
-    const std::vector<int16_t> pcm = left_channel(rate);
+    const std::vector<int16_t> pcm = mono_song(rate);
     for (auto _ : state) {
         int64_t length = 0;
         double *out = nullptr;
@@ -74,7 +75,7 @@ void convert(benchmark::State &state) {
 }
 
 void highlight(benchmark::State &state) {
-    std::vector<int16_t> pcm = left_channel(44100);
+    std::vector<int16_t> pcm = mono_song(44100);
     for (auto _ : state) {
         TAVO_HL_CTX *hl = static_cast<TAVO_HL_CTX *>(calloc(1, sizeof(TAVO_HL_CTX)));
         TAVO_CTX ctx{};
@@ -98,7 +99,7 @@ struct analysis {
 
 void open_analysis(analysis *a) {
     if (a->ana.empty()) {
-        const std::vector<int16_t> pcm = left_channel(kAnalysisRate);
+        const std::vector<int16_t> pcm = mono_song(kAnalysisRate);
         a->ana.assign(pcm.begin(), pcm.end());
     }
     a->onset.frame_size = kFrameSize;

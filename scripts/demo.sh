@@ -31,9 +31,9 @@ if [[ -z $file ]]; then
   quiet=build/release/quiet.wav
   echo "Making a sample song, and the same 12 dB softer:"
   quietly g++ -std=c++17 -O2 -I. -o build/make_song \
-    tests/support/make_song.cpp tests/support/song.cpp tests/support/song_wav.cpp
+    tests/support/make_song.cpp tests/support/song.cpp
   build/make_song "$file" --seconds 90 --bpm 120 --loud-at 30
-  build/make_song "$quiet" --seconds 90 --bpm 120 --loud-at 30 --level 0.25
+  build/make_song "$quiet" --seconds 90 --bpm 120 --loud-at 30 --drums 0.075 --bed 0.1
 fi
 
 show() {

@@ -1,11 +1,15 @@
-// What the codec tests share: encoded files made by tests/support/make_songs.sh, pieces of files,
-// media sources read to the end, and the checks of what comes out of them.
+// What tests of encoded files share: the files made by tests/support/make_songs.sh, pieces of
+// files, and media sources read to the end.
 #ifndef TAVO_TESTS_DESKTOP_CODEC_TEST_H
 #define TAVO_TESTS_DESKTOP_CODEC_TEST_H
 
 #include <gtest/gtest.h>
+#include <unistd.h>
 
+#include <algorithm>
 #include <cstdint>
+#include <fstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -20,49 +24,101 @@ using samples = std::vector<int16_t>;
 constexpr int64_t kUnits = 10'000'000;  // per second
 
 // Path of a fixture by its name: golden/NAME in the source tree, else of a song made for the tests.
-std::string fixture(const std::string &name);
+inline std::string fixture(const std::string &name) {
+    const bool kept = name.rfind("golden/", 0) == 0;
+    return kept ? CODEC_GOLDEN + name.substr(6) : CODEC_FIXTURES "/" + name;
+}
 
 // A file's contents; a missing or empty file fails the test.
-bytes load(const std::string &path);
+inline bytes load(const std::string &path) {
+    std::ifstream in(path, std::ios::binary);
+    bytes contents{std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+    EXPECT_FALSE(contents.empty()) << path;
+    return contents;
+}
 
-// Writes contents to a file of the running test's own and returns its path.
-std::string save(const std::string &name, const bytes &contents);
+// Writes contents to a file that is the running program's own, until it ends. Returns its path.
+inline std::string save(const std::string &name, const bytes &contents) {
+    static struct files {
+        std::vector<std::string> paths;
+        ~files() {
+            std::for_each(paths.begin(), paths.end(), [](auto &each) { unlink(each.c_str()); });
+        }
+    } saved;
+    const std::string path = testing::TempDir() + "tavo_" + std::to_string(getpid()) + "_" + name;
+    std::ofstream out(path, std::ios::binary);
+    const auto size = static_cast<std::streamsize>(contents.size());
+    out.write(reinterpret_cast<const char *>(contents.data()), size);
+    EXPECT_TRUE(out.good()) << path;
+    saved.paths.push_back(path);
+    return path;
+}
 
 // The bytes of a file in [from, to).
-bytes part(const bytes &file, size_t from, size_t to = SIZE_MAX);
+inline bytes part(const bytes &file, size_t from, size_t to = SIZE_MAX) {
+    return {file.begin() + static_cast<ptrdiff_t>(from),
+            file.begin() + static_cast<ptrdiff_t>(std::min(to, file.size()))};
+}
 
 // The pieces, one behind the other.
-bytes joined(const std::vector<bytes> &pieces);
+inline bytes joined(const std::vector<bytes> &pieces) {
+    bytes file;
+    for (const bytes &piece : pieces) file.insert(file.end(), piece.begin(), piece.end());
+    return file;
+}
 
-// A source and the path that it reads. source is null when it could not be opened; error says why.
+// A source. It is null when it could not be opened; error says why.
 struct opened {
     mtsrc_ctx *source = nullptr;
     int32_t error = 0;
     mtsrc_format format = {};
 
-    explicit opened(const std::string &path);
-    ~opened();
+    explicit opened(const std::string &path) {
+        const mtsrc_param param = {path.c_str()};
+        source = mtsrc_init(&param, &error);
+        EXPECT_TRUE(source == nullptr || mtsrc_getstream_format(source, &format) == 0);
+    }
+    ~opened() { EXPECT_TRUE(source == nullptr || mtsrc_deinit(source) == -5); }
     opened(const opened &) = delete;
     opened &operator=(const opened &) = delete;
 };
 
 // Reads up to limit samples from where the source stands. Any failure code fails the test.
-samples read(mtsrc_ctx *source, size_t limit);
+inline samples read(mtsrc_ctx *source, size_t limit = SIZE_MAX) {
+    constexpr int32_t kRequest = 8192;  // bytes, the pipeline's own
+    samples all;
+    samples piece(kRequest / 2);
+    for (int32_t code = 0; code == 0 && all.size() < limit;) {
+        mtsrc_frame frame = {piece.data(), 0};
+        code = mtsrc_getstream(source, kRequest, &frame);
+        EXPECT_TRUE(code == 0 || code == 1) << code;
+        all.insert(all.end(), piece.begin(), piece.begin() + frame.size / 2);
+    }
+    all.resize(std::min(all.size(), limit));
+    return all;
+}
 
 // All of a file's samples.
-samples read_all(const std::string &path);
+inline samples read_all(const std::string &path) {
+    const opened file(path);
+    EXPECT_NE(file.source, nullptr) << path << ": " << file.error;
+    return file.source != nullptr ? read(file.source) : samples{};
+}
 
 // The same samples; the first that differs is named.
-void expect_same(const samples &got, const samples &wanted);
-
-// The stream's duration is exact: the samples of a linear read. A seek to each of 40 places reports
-// the first sample at or after it, and delivers from there what a linear read delivers there. The
-// last quarter is no longer than a quarter of the duration holds, so that four parts decoded side
-// by side have the whole stream.
-void expect_exact_seams(const std::string &path);
+inline void expect_same(const samples &got, const samples &wanted) {
+    ASSERT_EQ(got.size(), wanted.size());
+    const auto differs = std::mismatch(got.begin(), got.end(), wanted.begin()).first;
+    EXPECT_EQ(differs - got.begin(), static_cast<ptrdiff_t>(got.size())) << "the first to differ";
+}
 
 // A callback record for a path, which must outlive it, for calling the codec library directly.
-mtsrc_io io_for(const std::string &path);
+inline mtsrc_io io_for(const std::string &path) {
+    mtsrc_io io = {};
+    mtsrc_file_callbacks(&io);
+    io.path = const_cast<char *>(path.c_str());  // read only by open
+    return io;
+}
 
 }  // namespace codec_test
 

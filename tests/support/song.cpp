@@ -1,7 +1,9 @@
 #include "tests/support/song.h"
 
+#include <algorithm>
 #include <cmath>
-#include <cstddef>
+#include <cstdio>
+#include <cstring>
 
 namespace support {
 namespace {
@@ -97,10 +99,7 @@ void add_hit(const song_spec &plan, double t, double strength, noise &random,
 }
 
 int16_t to_sample(double value) {
-    const double scaled = std::floor(value * 32767.0 + 0.5);
-    if (scaled > 32767.0) return 32767;
-    if (scaled < -32768.0) return -32768;
-    return static_cast<int16_t>(scaled);
+    return static_cast<int16_t>(std::clamp(std::floor(value * 32767.0 + 0.5), -32768.0, 32767.0));
 }
 
 }  // namespace
@@ -110,10 +109,9 @@ song make_song(const song_spec &plan) {
     made.plan = plan;
     const size_t frames = static_cast<size_t>(std::llround(plan.seconds * plan.rate));
     const size_t channels = static_cast<size_t>(plan.channels);
-    for (int k = 0;; ++k) {
-        const double t = kFirstHit + k * 60.0 / plan.bpm;
-        if (t >= plan.seconds) break;
+    for (double t = kFirstHit; t < plan.seconds;) {
         made.hits.push_back(t);
+        t = kFirstHit + static_cast<double>(made.hits.size()) * 60.0 / plan.bpm;
     }
 
     std::vector<double> drums(frames, 0.0);
@@ -130,14 +128,33 @@ song make_song(const song_spec &plan) {
     return made;
 }
 
-std::vector<int16_t> channel_of(const song &from, int32_t channel) {
-    const size_t channels = static_cast<size_t>(from.plan.channels);
-    std::vector<int16_t> out;
-    out.reserve(from.pcm.size() / channels);
-    for (size_t i = static_cast<size_t>(channel); i < from.pcm.size(); i += channels) {
-        out.push_back(from.pcm[i]);
+std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &plan) {
+    std::vector<uint8_t> out;
+    const auto put = [&out](const char *name, std::initializer_list<size_t> numbers) {
+        out.insert(out.end(), name, name + strlen(name));
+        for (const size_t number : numbers) {  // 32 bits, little-endian
+            for (int i = 0; i < 4; ++i) out.push_back(static_cast<uint8_t>(number >> 8 * i));
+        }
+    };
+    const size_t bytes = 2 * pcm.size();
+    const auto rate = static_cast<size_t>(plan.rate);
+    const size_t channels = static_cast<size_t>(plan.channels), frame = 2 * channels;
+    put("RIFF", {bytes + 36});
+    put("WAVEfmt ", {16, 1 | channels << 16, rate, rate * frame, frame | 16 << 16});
+    put("data", {bytes});
+    for (const int16_t sample : pcm) {
+        out.push_back(static_cast<uint8_t>(sample));
+        out.push_back(static_cast<uint8_t>(sample >> 8));
     }
     return out;
+}
+
+bool write_wav(const std::string &path, const song &what) {
+    const std::vector<uint8_t> content = wav_bytes(what.pcm, {what.plan.rate, what.plan.channels});
+    FILE *file = fopen(path.c_str(), "wb");
+    if (file == nullptr) return false;
+    const bool whole = fwrite(content.data(), 1, content.size(), file) == content.size();
+    return fclose(file) == 0 && whole;
 }
 
 }  // namespace support

@@ -31,27 +31,16 @@ struct song {
 
 song make_song(const song_spec &plan);
 
-// The samples of one channel.
-std::vector<int16_t> channel_of(const song &from, int32_t channel);
-
-enum class wav_data_size { honest, zero, all_ones, too_large };  // what the data header claims
-
 struct wav_spec {
     int32_t rate = 44100;
     int32_t channels = 2;
-    bool extensible = false;  // WAVE_FORMAT_EXTENSIBLE
-    wav_data_size data_size = wav_data_size::honest;
-    bool other_chunks = false;  // odd-length LIST, fact and JUNK between format and data, one after
-    bool junk_first = false;    // a JUNK chunk before the format
-    int64_t cut_bytes = 0;      // taken off the file's end
 };
 
-// A whole file of interleaved 16-bit samples.
+// A whole file of interleaved 16-bit samples, its header the canonical 44 bytes.
 std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &plan);
 
-// Both return false, with errno set, when the file cannot be written whole.
-bool write_bytes(const std::string &path, const std::vector<uint8_t> &bytes);
-bool write_wav(const std::string &path, const song &what);  // canonical: 44-byte header, 16 bits
+// False, with errno set, when the file cannot be written whole.
+bool write_wav(const std::string &path, const song &what);
 
 }  // namespace support
 
