@@ -17,34 +17,16 @@ using namespace std::string_literals;
 int starts_until_stop = INT32_MAX;  // thread starts, with the one at which a stop arrives
 int32_t *stop_flag = nullptr;
 
-// Struck bells, each heard until the next, no two equally loud. They fade ever more slowly and in
-// all bands alike, so that the envelope has its peaks at the hits alone. hits: their samples.
-std::vector<double> drum_song(double bpm, double seconds, double loudness = 1.0,
-                              std::vector<size_t> *hits = nullptr) {
+// Drums from 0 s on, each heard until the next, no two neighbours equally loud.
+std::vector<double> drum_song(double bpm, double seconds) {
     std::vector<double> song(static_cast<size_t>(seconds * kAnalysisRate));
     std::mt19937 random(4);
-    double height = 0.0;
-    size_t hit = 0;
-    double next = 0.25;
     for (size_t i = 0; i < song.size(); ++i) {
-        if (next + 0.2 < seconds && i == static_cast<size_t>(next * kAnalysisRate)) {
-            height = loudness * (1500.0 + 500.0 * uniform(&random));
-            hit = i;
-            next += 60.0 / bpm;
-            if (hits != nullptr) hits->push_back(hit);
-        }
-        const double t = static_cast<double>(i - hit) / kAnalysisRate;
-        for (double hz = 150.0; hz < 5500.0 && height > 0.0; hz += 250.0)
-            song[i] += height * cos(6.283185307179586 * hz * t) / (1.0 + t / 0.1);
+        const double beats = static_cast<double>(i) / kAnalysisRate * bpm / 60.0;
+        const double height = 2000.0 + 200.0 * (static_cast<int>(beats) * 7 % 10);
+        song[i] = height * uniform(&random) * exp(-8.0 * (beats - floor(beats)));
     }
     return song;
-}
-
-// Whether a tempo's period lies within a frame of another tempo's.
-bool within_a_frame(int32_t bpm, double tempo) {
-    const double period = 60.0 / (tempo * kHop);
-    return bpm >= std::floor(60.0 / ((period + 1.0) * kHop)) &&
-           bpm <= std::floor(60.0 / ((period - 1.0) * kHop));
 }
 
 // Runs an analysis with a click track and gives the file, empty when there is none.
@@ -70,56 +52,20 @@ int __wrap_pthread_create(pthread_t *thread, const pthread_attr_t *attr, void *(
 }
 }
 
-// Above about 144 BPM the prior favours the half tempo, which a period between two frames may
-// outweigh. Beats lie at least 3 s apart up to 95 BPM, or 1 s: 40 s have room for 12 at the
-// slowest.
-TEST(Beats, DrumsOfKnownTempo) {
-    for (const double tempo : {60.0, 80.0, 110.0, 128.0, 174.0}) {
-        std::vector<size_t> hits;
-        analysis of(drum_song(tempo, 40, 1.0, &hits));
-        const int32_t count = getBeatPosition(&of.ctx);
-        ASSERT_GE(count, 6) << tempo;
-        const int32_t bpm = of.ctx.onset->bpm;
-        EXPECT_TRUE(within_a_frame(bpm, tempo) || (tempo > 144 && within_a_frame(bpm, tempo / 2)))
-            << tempo << ": " << bpm;
-        EXPECT_EQ(of.ctx.state, kStateFinished);
-        const float *beats = of.ctx.onset->beat_times;
-        EXPECT_TRUE(std::is_sorted(beats, beats + count));
-        for (int32_t k = 0; k < count; ++k) {
-            const auto is_near = [&](size_t hit) {
-                return std::fabs(beats[k] / 1000.0 - static_cast<double>(hit) / 11025.0) <= kHop;
-            };
-            EXPECT_TRUE(std::any_of(hits.begin(), hits.end(), is_near)) << tempo << ": " << k;
-        }
-    }
-}
-
-// The last minute decides, and in a song of more than two minutes the second one. Before and behind
-// it are louder drums of another tempo.
-TEST(Beats, OneMinuteDecidesTheTempo) {
-    for (const double tail : {0.0, 70.0}) {
-        std::vector<double> song = drum_song(128, 60, 4.0);
-        for (const double x : drum_song(96, 60)) song.push_back(x);
-        for (const double x : drum_song(128, tail, 4.0)) song.push_back(x);
-        analysis of(song);
-        getBeatPosition(&of.ctx);
-        EXPECT_TRUE(within_a_frame(of.ctx.onset->bpm, 96)) << of.ctx.onset->bpm;
-    }
-}
-
-// Ten seconds of a quiet drum, then a loud one with hiss: the onset between them is a beat although
-// only one is asked for and much sharper onsets follow it.
+// Quiet noise, then loud: the onset between them is a beat although only one is asked for and much
+// sharper onsets follow it, out of silence.
 TEST(Beats, RiseForcesABeat) {
-    std::vector<double> song = drum_song(120, 24);
     std::mt19937 random(9);
+    std::vector<double> song(90 * 11025);
     for (size_t i = 0; i < song.size(); ++i) {
-        song[i] = i < 10 * 11025 ? 0.05 * song[i] : song[i] + 16000.0 * uniform(&random);
+        const bool silent = i % 5512 > 3000 && i % 5512 < 3700;
+        song[i] = (i < 50 * 11025 ? 2000.0 : silent ? 0.0 : 16000.0) * uniform(&random);
     }
     analysis of(song);
     EXPECT_GT(getBeatPosition(&of.ctx), 1);
     of.ctx.onset->max_beats = 1;
     ASSERT_EQ(getBeatPosition(&of.ctx), 1);
-    EXPECT_NEAR(of.ctx.onset->beat_times[0], 10000.0, 300.0);
+    EXPECT_NEAR(of.ctx.onset->beat_times[0], 50000.0, 100.0);
 }
 
 // Four threads take the envelope. A stop before it leaves the tempo alone, one that arrives with it
@@ -146,14 +92,15 @@ TEST(Beats, Stop) {
 // Silence and signals too short for an envelope have 90 BPM and no beats. The file has half the
 // signal, to which the blips come with a gain of 1.25; 1001 and -1001 halve towards zero.
 TEST(Beats, FileHoldsHalfTheSignalAndTheBlips) {
-    for (const size_t n : {0u, 1u, 255u, 256u, 257u, 511u, 512u, 767u, 11025u, 132300u}) {
-        std::vector<double> samples(n, n < 768 ? 1001.0 : 0.0);
-        if (n > 1) samples[1] = -samples[0];
-        if (n > 11025) samples = drum_song(120, 12);
-        analysis of(samples);
+    for (const size_t n : {0u, 1u, 511u, 512u, 767u, 11025u, 132300u}) {
+        std::vector<double> signal(n, n < 768 ? 1001.0 : 0.0);
+        if (n > 1) signal[1] = -signal[0];
+        if (n > 11025) signal = drum_song(120, 12);
+        analysis of(signal);
         const std::string file = analyse_to_file(&of);
         const TAVO_ONSET_CTX *onset = of.ctx.onset;
         EXPECT_EQ(onset->bpm == 90 && onset->beat_times == nullptr, n <= 11025) << n;
+        EXPECT_NEAR(onset->bpm, n > 11025 ? 120 : 90, 3);  // of whole frames, 123 or 117
         EXPECT_EQ(of.ctx.state, kStateFinished) << n;
         ASSERT_EQ(file.size(), 44 + 2 * n);
         if (n == 512) {  // 1060 bytes; PCM, mono, 11025 Hz, 22050 bytes a second; 1024 bytes
@@ -164,11 +111,11 @@ TEST(Beats, FileHoldsHalfTheSignalAndTheBlips) {
         }
         std::vector<float> track(n);
         makeBlipTrack(onset->beat_times, onset->beat_count, 11025, of.ctx.ana_len, track.data());
+        std::vector<int16_t> samples(n);
+        file.copy(reinterpret_cast<char *>(samples.data()), 2 * n, 44);
         for (size_t i = 0; i < n; ++i) {
-            int16_t sample = 0;
-            memcpy(&sample, file.data() + 44 + 2 * i, sizeof sample);
-            ASSERT_TRUE(n >= 768 || sample == (samples[i] > 0.0 ? 500 : -500)) << i;
-            ASSERT_NEAR(sample, samples[i] / 2 + 1.25 * 32767.0 * track[i], 1.0) << i;
+            ASSERT_TRUE(n >= 768 || samples[i] == (signal[i] > 0.0 ? 500 : -500)) << i;
+            ASSERT_NEAR(samples[i], signal[i] / 2 + 1.25 * 32767.0 * track[i], 1.0) << i;
         }
         fnamedec = n % 2 == 0 ? "/nowhere/at/all.wav" : nullptr;
         EXPECT_EQ(getBeatPosition(&of.ctx) > 2, n > 11025);

@@ -38,6 +38,7 @@ TEST(PowerRise, Steps) {
         // Ten samples of -32768 have a mean of 32769, beyond 16 bits. The target is the top, 0 dB,
         // which only ten loud samples reach.
         {kBegin + 2000, -32768.0 / 32767.0, kBegin + 2005},
+        {kBegin + kBlock - 5, -32768.0 / 32767.0, kBegin + kBlock},  // at the block's last sample
     };
     for (const auto &c : cases) {
         std::vector<double> signal(20 * kBlock + 100, c.sample);

@@ -5,58 +5,95 @@
 
 namespace {
 
-constexpr int32_t kLags = 86;  // two seconds
+struct pulse_pair {
+    size_t first, lag;  // frames
+    double weight;
+};
 
-int32_t bpm_of(const std::vector<double> &x, int64_t nfft, int32_t lags = kLags) {
-    return calc_bpm_acf(x.data(), nfft, lags, static_cast<int32_t>(x.size()), kHop);
+int32_t tempo_of(std::vector<double> env, const std::vector<pulse_pair> &pairs = {}) {
+    for (const pulse_pair &pair : pairs) {
+        env[pair.first] = 1.0;
+        env[pair.first + pair.lag] = pair.weight;
+    }
+    TAVO_BEAT_CTX beat = {};
+    beat.onset_env = env.data();
+    beat.frame_count = static_cast<int64_t>(env.size());
+    beat.hop_seconds = kHop;
+    return estimate_tempo(&beat);
 }
 
 }  // namespace
 
-// Frames to BPM: 2583.984375 / period. With pulses every p frames the correlation at p and 2p is
-// nearly the same, so the prior decides: p up to about 144 BPM, else 2p.
-TEST(Tempo, Pulses) {
+// Pairs far from each other correlate at their lags alone. The prior weighs them:
+//     lag  13     20     27     39     40     41     42     59     60     61     81
+//          0.767  0.994  0.948  0.693  0.671  0.650  0.629  0.347  0.335  0.324  0.161
+// 2583.984375 frames a minute over the lag is the tempo: 129 BPM for 20, 95 for 27.
+TEST(Tempo, ScoresOfKnownCorrelations) {
     const struct {
-        size_t length;
-        int64_t nfft;
-        size_t period;
+        std::vector<std::pair<size_t, double>> weights;  // of each lag
         int32_t bpm;
     } cases[] = {
-        {2584, 4096, 20, 129},  // weights 0.994 and 0.671: share 0.599
-        {2584, 4096, 13, 99},   // 198.77 BPM, weights 0.767 and 0.964: share 0.444, 26 frames
-        {2584, 4096, 42, 61},   // the longest period looked at
-        {2584, 4096, 44, 58},   // found as the double of 22, where nothing is
-        {1290, 2048, 20, 129},  // half a minute
-        {42, 64, 20, 129},      // a second: more lags than the transform has values
-        {10, 16, 4, 80},        // the circle of 16 correlates best; 161 BPM, so 32 frames
+        {{{13, 1}}, 198},
+        {{{12, 1}}, 90},            // 215 BPM is not believed
+        {{{18, 1}, {26, 1}}, 143},  // 0.967 and 0.964: on either side of 120 BPM
+        {{{18, 1}, {26, 1.01}}, 99},
+        // 20 and its double have 0.994 + 0.5 x 0.671 = 1.330, or its double's neighbours 0.25 x
+        // 1.342; 27 has 1.313 or 1.346, 1.300 or 1.360.
+        {{{20, 1}, {40, 1}, {27, 1.385}}, 129},
+        {{{20, 1}, {40, 1}, {27, 1.42}}, 95},
+        {{{20, 1}, {39, 1}, {41, 1}, {27, 1.371}}, 129},
+        {{{20, 1}, {39, 1}, {41, 1}, {27, 1.434}}, 95},
+        // With its triple and the triple's neighbours 0.33 x 1.006; 27 has 1.313 or 1.340.
+        {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.385}}, 129},
+        {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.413}}, 95},
+        // The share of 20 against its double, 0.533 or 0.527; the double has 64 BPM.
+        {{{20, 1}, {40, 1.30}}, 129},
+        {{{20, 1}, {40, 1.33}}, 64},
+        // The longest lags: 42 against 27 with 0.45, and 81 as the triple of 27, whose share is
+        // 0.51.
+        {{{42, 1}, {27, 0.475}}, 61},
+        {{{27, 1}, {81, 5.6}}, 31},
     };
     for (const auto &c : cases) {
-        std::vector<double> x(c.length);
-        for (size_t i = 0; i < c.length; i += c.period) x[i] = 1.0;
-        EXPECT_EQ(bpm_of(x, c.nfft), c.bpm) << c.length << " frames, period " << c.period;
+        std::vector<pulse_pair> pairs;
+        for (const auto &[lag, weight] : c.weights)
+            pairs.push_back({100 + 200 * pairs.size(), lag, weight});
+        EXPECT_EQ(tempo_of(std::vector<double>(2584), pairs), c.bpm) << c.weights.back().second;
     }
 }
 
-// Pulses far from each other correlate at their distances alone. 12: 60 / (12 hops) = 215.33.
-// Twenty and, of its triple's neighbours, 59 weigh 0.994 + 0.33 * 4 * 0.347, more than 24
-// alone: 1.44 * 0.988. No period, as in silence, counts as above every tempo.
-TEST(Tempo, SinglePeriods) {
-    std::vector<double> x(2584);
-    x[100] = x[112] = 1.0;
-    EXPECT_EQ(bpm_of(x, 4096), 215);
-    TAVO_BEAT_CTX beat = {};
-    beat.onset_env = x.data();
-    beat.frame_count = 2584;
-    beat.hop_seconds = kHop;
-    EXPECT_EQ(estimate_tempo(&beat), 90);  // above 200
-    x[112] = 0.0;
-    x[120] = 1.0;
-    x[300] = x[359] = 2.0;
-    x[600] = x[624] = 1.2;
-    EXPECT_EQ(bpm_of(x, 4096), 129);
+// The last minute decides, in a song of more than two minutes the second one: frames 2583 to 5166
+// of 7750, 416 to 2999 of 3000. A pair that counts, 20 frames apart, outweighs the other.
+TEST(Tempo, OneMinuteDecides) {
+    const struct {
+        size_t frames, first;
+        int32_t bpm;
+    } cases[] = {{7750, 2583, 129}, {7750, 2582, 95}, {7750, 5146, 129},
+                 {7750, 5147, 95},  {3000, 416, 129}, {3000, 415, 95}};
+    for (const auto &c : cases)
+        EXPECT_EQ(tempo_of(std::vector<double>(c.frames), {{2900, 27, 0.5}, {c.first, 20, 1.0}}),
+                  c.bpm)
+            << c.first;
+}
+
+// Pulses every p frames correlate at p and 2p nearly the same, so the prior decides: p up to about
+// 144 BPM, else 2p. No period, as in silence, is 90 BPM, and above every tempo to calc_bpm_acf.
+TEST(Tempo, ShortExcerpts) {
+    const struct {
+        size_t length, period;
+        int32_t bpm;
+    } cases[] = {{1290, 20, 129},  // half a minute
+                 {42, 20, 129},    // a second: more lags than the transform has values
+                 {10, 4, 80}};     // the circle of 16 correlates best; 161 BPM, so 32 frames
+    for (const auto &c : cases) {
+        std::vector<double> env(c.length);
+        for (size_t i = 0; i < c.length; i += c.period) env[i] = 1.0;
+        EXPECT_EQ(tempo_of(env), c.bpm) << c.length << " frames, period " << c.period;
+    }
     for (const double odd_one : {0.0, double{NAN}, double{INFINITY}}) {
-        x.assign(64, 0.0);
-        x[5] = odd_one;
-        for (const int32_t lags : {kLags, 3}) EXPECT_GT(bpm_of(x, 64, lags), 200) << odd_one;
+        std::vector<double> env(64);
+        env[5] = odd_one;
+        EXPECT_EQ(tempo_of(env), 90) << odd_one;
+        EXPECT_GT(calc_bpm_acf(env.data(), 64, 3, 64, kHop), 200) << odd_one;
     }
 }

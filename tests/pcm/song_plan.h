@@ -42,26 +42,20 @@ inline byte_run operator+(byte_run left, const byte_run &right) {
     return left;
 }
 
-inline sample_run samples_of(const byte_run &bytes) {
-    sample_run samples(bytes.size() / 2);
-    if (!samples.empty()) memcpy(samples.data(), bytes.data(), samples.size() * 2);
-    return samples;
-}
-
-// The n values of a conversion's output, which is freed.
+// The n values of a conversion's output and the 64 cleared bytes behind them. Frees the output.
 inline signal_run taken(double *out, int64_t n) {
-    for (int64_t i = n; i < n + 8; ++i) EXPECT_EQ(out[i], 0.0);  // 64 cleared bytes follow
-    signal_run result(out, out + n);
+    signal_run result(out, out + n + 8);
     free(out);
     return result;
 }
 
-// The analysis signal of count samples at a rate.
-inline signal_run converted(const int16_t *samples, size_t count, int32_t rate) {
+// The same, converted from so many bytes of PCM.
+inline signal_run converted(const void *pcm, size_t bytes, int32_t rate) {
     int64_t n = -1;
     double *out = nullptr;
-    const auto bytes = static_cast<int64_t>(count * 2);
-    EXPECT_EQ(dorn_resampler_run(samples, bytes, rate, kAnalysisRate, &n, &out), 0);
+    EXPECT_EQ(dorn_resampler_run(static_cast<const int16_t *>(pcm), int64_t(bytes), rate,
+                                 kAnalysisRate, &n, &out),
+              0);
     EXPECT_TRUE(ext_mutex_resample == nullptr && ext_cond_resample == nullptr);
     return taken(out, n);
 }

@@ -28,9 +28,8 @@ class from_highlight : public song_plan {
         EXPECT_EQ(tavo_get_from_here(&ctx, pos), 0);
         EXPECT_EQ(ctx.pcm, nullptr);
         EXPECT_EQ(hl.hl_pos, hl_pos);
-        const sample_run samples = samples_of(bytes);
         EXPECT_EQ(taken(std::exchange(ctx.ana, nullptr), ctx.ana_len),
-                  converted(samples.data(), samples.size(), kRate));
+                  converted(bytes.data(), bytes.size(), kRate));
     }
 
     const byte_run stream = noise(kBytes, 1);
@@ -120,24 +119,24 @@ TEST_F(from_highlight, what_is_left) {
     }
 }
 
+// One record on the heap, of a plan of four: any other that is read is seen. It tells of 50,000
+// bytes of PCM, and with a duration of 0 of no number.
 TEST_F(from_highlight, comparison_reads_its_record_alone) {
     ASSERT_EQ(plan(kDuration, kRate, stream), 0);
-    // One record on the heap, of a plan of four: any other that is read is seen.
     const auto seg = std::make_unique<TAVO_DECSEG>();
     seg->fmt.sample_rate = kRate;
     seg->src = ctx.seg[0].src;
     seg->start = 10'000'000;
-    // The record tells 50,000 bytes, and with a duration of 0 no number.
-    const sample_run pcm = samples_of(stream);
-    for (const auto &[duration, landed] :
-         {std::pair<int64_t, int64_t>{41'250'000, 50'000 - kBlock - 200},
-          {41'250'000, 50'000 - kBlock - 199},
-          {0, 60'000}}) {
-        const bool found = landed != 50'000 - kBlock - 199;
+    byte_run pcm = stream;
+    for (const auto &[duration, landed, found] :
+         {std::tuple{41'250'000, 50'000 - kBlock - 200, true},
+          {41'250'000, 50'000 - kBlock - 199, false},
+          {0, 60'000, true}}) {
         seg->duration = duration;
         sources[0].at = landed;
         int64_t off = 43'000;
-        EXPECT_EQ(_compare_decoded(seg.get(), pcm.data(), &off), found ? 0 : -1);
+        const auto *samples = reinterpret_cast<const int16_t *>(pcm.data());
+        EXPECT_EQ(_compare_decoded(seg.get(), samples, &off), found ? 0 : -1);
         EXPECT_EQ(off, found ? landed : 43'000);
     }
 }
