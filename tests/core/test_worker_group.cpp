@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <numeric>
 
 #include "common/worker_group.h"
@@ -34,7 +35,12 @@ void report(void *record) {
     worker_group_done(mutex, cond, done, 4, static_cast<member *>(record)->index);
 }
 
+std::atomic<int> ended;  // threads
+
 void *enter(void *record) {
+    thread_local const struct at_exit {
+        ~at_exit() { ++ended; }
+    } mark;
     run_worker(record, work, report);
 }
 
@@ -56,8 +62,10 @@ TEST(WorkerGroup, EveryWorkerRunsOnceWhateverCanBeStarted) {
         const bool forever = round % 2 != 0;
         fault::arm({fault::kThread, refused, forever});
         finished = 0;
+        ended = 0;
         worker_group_run(slots, 4, mutex, cond, done);
         ASSERT_EQ(finished, 4);
+        ASSERT_EQ(ended, 4 - fault::refused());
         ASSERT_EQ(stale_flags, 0);
         for (int i = 0; i < 4; ++i) {
             ASSERT_EQ(done[i], 1);

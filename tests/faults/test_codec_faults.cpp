@@ -27,8 +27,8 @@ namespace {
 constexpr unsigned kLongest = 30;  // seconds of one job
 constexpr long kMostMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
-constexpr int kCalls = 2;         // of a value, tried by the quick tier
-constexpr int kStep = 31;  // of what there is to try at those, the quick tier takes one in so many
+// The quick tier tries this many calls of a value, and one in so many of the answers there.
+constexpr int kCalls = 2, kStep = 31;
 
 // What each value is replaced by: anything, and what is close to a limit of its own.
 std::vector<int64_t> answers_for(const std::string &value) {
@@ -54,12 +54,12 @@ using place = std::pair<std::string, std::string>;  // function and value
 // The fault of the run going on. The hook runs under the scripted library's lock; between runs no
 // other thread is alive.
 struct fault {
-    place where;
+    place where = {};
     int64_t call = -1;
     int64_t answer = 0;
     bool ever = false;
     bool struck = false;
-    std::map<place, int64_t> calls;
+    std::map<place, int64_t> calls = {};
 } now;
 
 int64_t hand_back(const std::string &function, const std::string &value, int64_t truth) {
@@ -97,18 +97,14 @@ class CodecFaults : public testing::TestWithParam<std::string> {
         scripted::all = {};
         scripted::all.use(script);
         scripted::all.tamper = hand_back;
-        now.calls.clear();
-        now.struck = false;
         int32_t err = 99;
         TAVO_CTX *ctx = job::create(path, mode, &err);
-        bool good = err == (ctx != nullptr ? TAVO_OK : TAVO_ERR_HANDLE);
-        last = {};
+        bool good = err == TAVO_ERR_HANDLE && job::last.calls == 0;
         if (ctx != nullptr) {
-            good = good && tavo_analyze(ctx, 0, 0, 0) == TAVO_OK;
-            last = job::wait();
-            good = good && !job::flaw_of(last, mode) && tavo_deinit(ctx) == TAVO_OK;
+            good = err == TAVO_OK && tavo_analyze(ctx, 0, 0, 0) == TAVO_OK;
+            job::wait();
+            good = tavo_deinit(ctx) == TAVO_OK && !job::flaw_of(job::last, mode) && good;
         }
-        good = good && job::last.calls == (ctx != nullptr ? 1 : 0);
         return good && scripted::all.alive.empty() && scripted::tags_are_empty() &&
                scripted::all.faults.empty();
     }
@@ -118,10 +114,7 @@ class CodecFaults : public testing::TestWithParam<std::string> {
         for (const int64_t answer : answers_for(where.second)) {
             for (const bool ever : {false, true}) {
                 if (all == nullptr && turn++ % kStep != 0) continue;
-                now.where = where;
-                now.call = call;
-                now.answer = answer;
-                now.ever = ever;
+                now = {where, call, answer, ever};
                 snprintf(current, sizeof current, "%s %s %s=%lld at call %lld%s in mode %d\n",
                          GetParam().c_str(), where.first.c_str(), where.second.c_str(),
                          static_cast<long long>(answer), static_cast<long long>(call),
@@ -135,18 +128,12 @@ class CodecFaults : public testing::TestWithParam<std::string> {
 
     std::string path = testing::TempDir() + "tavo_codec_faults_" + std::to_string(getpid());
     scripted::script script;
-    job::result last;
     int turn = 0, struck = 0;
 };
 
 TEST_P(CodecFaults, AreSurvived) {
-    support::song_spec plan;
-    plan.rate = 8000;
-    plan.channels = GetParam() == "ogg" ? 1 : 2;  // what the decoder is asked for
-    plan.seconds = 15.5;
-    plan.loud_at = 6.0;
-    plan.tail_at = 15.0;
-    script = script_of(support::make_song(plan));
+    const int32_t channels = GetParam() == "ogg" ? 1 : 2;  // what the decoder is asked for
+    script = script_of(support::make_song({8000, channels, 15.5, 120.0, 1, 6.0, 15.0}));
     const source_row &row = row_of(GetParam());
     if (row.tag != 0) script.codec = row.tag;
     std::ofstream(path) << row.file;
@@ -156,8 +143,8 @@ TEST_P(CodecFaults, AreSurvived) {
     });
     for (const int32_t mode : {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH}) {
         now = fault{};
-        ASSERT_TRUE(run(mode) && last.status == 0) << mode;
-        EXPECT_EQ(last.hl_pos > 1000, mode != TAVO_MODE_BEATS);  // so that mode 2 seeks
+        ASSERT_TRUE(run(mode) && job::last.status == 0) << mode;
+        EXPECT_EQ(job::last.hl_pos > 1000, mode != TAVO_MODE_BEATS);  // so that mode 2 seeks
         const std::map<place, int64_t> calls = now.calls;
         for (const auto &[where, times] : calls) {
             const int64_t step = std::max<int64_t>(1, times / kCalls);
