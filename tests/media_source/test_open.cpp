@@ -79,7 +79,6 @@ TEST_F(OpenClose, ContainersChooseTheFirstAudioTrack) {
             int32_t chosen;  // -1: none
         } cases[] = {{{2, 0, 1, 1}, 4, 2},
                      {{2, 1}, 1, -1},
-                     {{1}, -1, -1},
                      {none, 1'000'000'000, -1},
                      {last, 1'000'000'000, mp4 ? 63 : 15}};
         for (const auto &each : cases) {
@@ -100,10 +99,8 @@ TEST_F(OpenClose, VorbisSetUpDataReachTheDecoder) {
     EXPECT_EQ(decoded.records[0].substr(sizeof frame.data), bytes_of(frame).substr(8));
     EXPECT_EQ(decoded.records[1], zeros(sizeof(wexa_output)));
     EXPECT_TRUE(decoded.records[3] == plan.setup);
-    for (const int32_t length : {-1, (1 << 24) + 1}) {
-        plan.setup_length = length;
-        EXPECT_EQ(open_row(row_of("ogg"), plan), -7);
-    }
+    plan.setup_length = (1 << 24) + 1;
+    EXPECT_EQ(open_row(row_of("ogg"), plan), -7);
     plan.setup = std::string(24, 'x');  // a size that malloc gives out without more
     plan.setup_length.reset();
     ASSERT_EQ(open_row(row_of("ogg"), plan), 0);
@@ -111,19 +108,21 @@ TEST_F(OpenClose, VorbisSetUpDataReachTheDecoder) {
 }
 
 TEST_F(OpenClose, WithoutAHandleAProbeFileOrTheMark) {
+    using codes = std::vector<int32_t>;
     int64_t reached = 77;
     char byte = 0;
     mtsrc_frame frame = {&byte, 77};
+    mtsrc_format unused = {};
+    mtsrc_ctx empty = {};
     for_each_row([&](const source_row &row) {
         ASSERT_EQ(open_row(row), 0);
         const mtsrc_ctx format = *src;
         close_source();
         scripted::all.calls.clear();
-        mtsrc_ctx empty = {};
         format.close(nullptr);
-        EXPECT_TRUE(format.open(nullptr) == -4 && format.open(&empty) == -7);
-        EXPECT_TRUE(format.seek(nullptr, 0, &reached) == -4 && format.reset(nullptr) == -4);
-        EXPECT_EQ(format.get_frm(nullptr, 0, &frame), -4);
+        EXPECT_EQ(codes({format.open(nullptr), format.open(&empty), format.reset(nullptr),
+                         format.seek(nullptr, 0, &reached), format.get_frm(nullptr, 0, &frame)}),
+                  codes({-4, -7, -4, -4, -4}));
         EXPECT_EQ(scripted::call_names(), "");
     });
     ASSERT_EQ(open_row(row_of("mp4 with aac")), 0);
@@ -131,13 +130,11 @@ TEST_F(OpenClose, WithoutAHandleAProbeFileOrTheMark) {
     EXPECT_EQ(mtsrc_seekstream(src, 5, &reached), -4);
     src->dstream = stream;
     EXPECT_EQ(mtsrc_getstream_format(src, nullptr), -4);
-    mtsrc_ctx unmarked = {};
-    memcpy(&unmarked.mark, "KOVB", 4);
-    for (mtsrc_ctx *bad : {static_cast<mtsrc_ctx *>(nullptr), &unmarked}) {
-        mtsrc_format unused = {};
-        EXPECT_TRUE(mtsrc_getstream_format(bad, &unused) == -4 && mtsrc_reset(bad) == -4);
-        EXPECT_TRUE(mtsrc_seekstream(bad, 5, &reached) == -4 && mtsrc_deinit(bad) == -4);
-        EXPECT_EQ(mtsrc_getstream(bad, 1, &frame), -4);
+    memcpy(&empty.mark, "KOVB", 4);
+    for (mtsrc_ctx *bad : {static_cast<mtsrc_ctx *>(nullptr), &empty}) {
+        EXPECT_EQ(codes({mtsrc_getstream_format(bad, &unused), mtsrc_reset(bad), mtsrc_deinit(bad),
+                         mtsrc_seekstream(bad, 5, &reached), mtsrc_getstream(bad, 1, &frame)}),
+                  codes(5, -4));
     }
     EXPECT_TRUE(frame.size == 77 && reached == 77);
 }
