@@ -4,7 +4,6 @@
 
 #include <cmath>
 #include <cstdlib>
-#include <cstring>
 #include <random>
 #include <vector>
 
@@ -49,30 +48,6 @@ struct working_context {
 
 inline double uniform(std::mt19937 *random) {
     return static_cast<double>((*random)()) / 2147483648.0 - 1.0;
-}
-
-// Between -1 and 1; or of any size up to 2^highest; or mostly, or but for its signs, nothing; or
-// too small to have its full precision.
-inline std::vector<double> wild_samples(size_t n, int highest, std::mt19937 *random) {
-    std::vector<double> samples(n);
-    const auto kind = (*random)() % 5;
-    for (double &x : samples) {
-        x = uniform(random);
-        if (kind == 1) x = std::ldexp(x, static_cast<int>((*random)() % 200) - 200 + highest);
-        if (kind == 2) x = (*random)() % 3 == 0 ? x : 0.0;
-        if (kind == 3) x = std::ldexp(x, -1074 + static_cast<int>((*random)() % 60));
-        if (kind == 4) x = (*random)() % 2 == 0 ? 0.0 : -0.0;
-    }
-    return samples;
-}
-
-// The same bits, or both no numbers.
-inline bool same_bits(const double *a, const std::vector<double> &b) {
-    for (size_t i = 0; i < b.size(); ++i) {
-        if (std::isnan(b[i]) ? !std::isnan(a[i]) : memcmp(&a[i], &b[i], sizeof b[i]) != 0)
-            return false;
-    }
-    return true;
 }
 
 #endif

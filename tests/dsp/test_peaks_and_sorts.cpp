@@ -16,30 +16,6 @@ namespace {
 using indexes = std::vector<int32_t>;
 using list = std::vector<double>;
 
-const list kThree = {0, 4, 0, 9, 0, 7, 0};  // peaks 1, 3, 5
-
-indexes largest(const list &values, uint32_t min_dist, uint32_t max_count) {
-    const std::vector<float> x(values.begin(), values.end());
-    std::vector<uint32_t> out(x.size() / 2 + 1);
-    const int32_t n =
-        findsortedNPeaks(x.data(), static_cast<int64_t>(x.size()), min_dist, max_count, out.data());
-    return {out.begin(), out.begin() + n};
-}
-
-indexes spaced(const list &x, uint32_t min_dist) {
-    indexes out(x.size() / 2 + 1);
-    const int32_t n = findPeaks(x.data(), static_cast<int64_t>(x.size()), min_dist, out.data());
-    return {out.begin(), out.begin() + n};
-}
-
-indexes with_priority(const list &x, int32_t min_dist, const indexes &priority) {
-    indexes out(x.size() / 2 + 1 + priority.size());
-    const int32_t n = findPeaksPriority(x.data(), static_cast<int64_t>(x.size()), min_dist,
-                                        out.data(), priority.empty() ? nullptr : priority.data(),
-                                        static_cast<int32_t>(priority.size()));
-    return {out.begin(), out.begin() + n};
-}
-
 template <typename Value>
 int order(int (*compare)(const void *, const void *), Value a, Value b) {
     return compare(&a, &b);
@@ -47,61 +23,32 @@ int order(int (*compare)(const void *, const void *), Value a, Value b) {
 
 }  // namespace
 
-TEST(Peaks, ByDistance) {
-    const struct {
-        list x;
-        uint32_t min_dist;
-        indexes expected;
-    } cases[] = {{{1, 3, 3, 1}, 0, {}},
-                 {{}, 0, {}},
-                 {kThree, 0, {1, 3, 5}},
-                 {kThree, 2, {3, 5, 1}},  // the range is open
-                 {kThree, 3, {3}},
-                 {kThree, UINT32_MAX, {3}},
-                 // 9 at 3 suppresses 8 at 5, which therefore leaves 7 at 7.
-                 {{0, 0, 0, 9, 0, 8, 0, 7, 0}, 3, {3, 7}}};
-    for (const auto &c : cases) EXPECT_EQ(spaced(c.x, c.min_dist), c.expected) << c.min_dist;
-}
-
-TEST(Peaks, LargestFirstUpToACount) {
-    const struct {
-        list x;
-        uint32_t min_dist, max_count;
-        indexes expected;
-    } cases[] = {{kThree, 0, 2, {3, 5}},       {kThree, 0, 10, {3, 5, 1}},
-                 {kThree, 0, 0, {3, 5, 1}},    {kThree, 2, 0, {3}},  // the range is closed
-                 {kThree, UINT32_MAX, 0, {3}}, {{0, 4, 0, 9, 0, 7, 0, 0, 3, 0}, 2, 2, {3, 8}}};
-    for (const auto &c : cases) {
-        EXPECT_EQ(largest(c.x, c.min_dist, c.max_count), c.expected) << c.min_dist;
-    }
+// Peaks at 3, 5, 7. 9 suppresses 8 within 3, exclusive, or within 2, inclusive; that leaves 7.
+TEST(Peaks, Suppressed) {
+    const list x = {0, 0, 0, 9, 0, 8, 0, 7, 0};
+    const std::vector<float> single(x.begin(), x.end());
+    indexes out(4);
+    std::vector<uint32_t> largest(4);
+    EXPECT_EQ(findPeaks(x.data(), 9, 3, out.data()), 2);
+    EXPECT_EQ(out, (indexes{3, 7, 0, 0}));
+    EXPECT_EQ(findsortedNPeaks(single.data(), 9, 2, 1, largest.data()), 1);
+    EXPECT_EQ(findsortedNPeaks(single.data(), 9, 2, 0, largest.data()), 2);
+    EXPECT_EQ(largest, (std::vector<uint32_t>{3, 7, 0, 0}));
     EXPECT_EQ(findsortedNPeaks(nullptr, -5, 1, 0, nullptr), 0);
-}
-
-TEST(Peaks, PriorityCandidatesComeFirst) {
-    const struct {
-        int32_t min_dist;
-        indexes priority, expected;
-    } cases[] = {{3, {2}, {1, 5}},
-                 {3, {5}, {3}},           // the last peak: nothing
-                 {3, {0, 1}, {1, 1, 5}},  // taken twice
-                 {1, {4, 0}, {3, 1, 5}},  // in the order given
-                 {3, {99, 0}, {1, 5}},    // packed
-                 {3, {1, 3}, {1, 3}},     // too close, yet both kept
-                 {3, {}, {3}}};
-    for (const auto &c : cases)
-        EXPECT_EQ(with_priority(kThree, c.min_dist, c.priority), c.expected);
-    int32_t untouched = -7;
-    EXPECT_EQ(findPeaksPriority(kThree.data(), 7, 0, &untouched, nullptr, 0), -1);
-    EXPECT_EQ(untouched, -7);
+    const int32_t priority[] = {5, 99};  // the second's nearest is the last peak: nothing
+    EXPECT_EQ(findPeaksPriority(x.data(), 9, 3, out.data(), priority, 2), 1);
+    EXPECT_EQ(out, (indexes{5, 7, 0, 0}));
+    EXPECT_EQ(findPeaksPriority(x.data(), 9, 0, nullptr, nullptr, 0), -1);
 }
 
 // A long recording's worth: striking in pairs would take the test's whole time limit.
 TEST(Peaks, AQuarterOfAMillionPeaks) {
     list x(500001);
     for (size_t i = 1; i < x.size(); i += 2) x[i] = 1.0 + static_cast<double>(i * 7919 % 500000);
-    EXPECT_EQ(spaced(x, 2).size(), 250000u);
-    const indexes out = with_priority(x, 200000, indexes(100000, 250000));
-    EXPECT_EQ(std::count(out.begin(), out.end(), 249999), 100000);
+    indexes out(350000), priority(100000, 250000);
+    EXPECT_EQ(findPeaks(x.data(), 500001, 2, out.data()), 250000);
+    findPeaksPriority(x.data(), 500001, 200000, out.data(), priority.data(), 100000);
+    EXPECT_EQ(std::count(out.begin(), out.begin() + 100000, 249999), 100000);
 }
 
 TEST(Peaks, Searches) {
@@ -167,25 +114,17 @@ TEST(Sort, DepthStaysSmallOnTheWorstInput) {
 
 // Above 2^24 a float no longer counts by ones, and near 5.6 million its step is 0.5.
 TEST(Stats, PopulationDeviationInBothPrecisions) {
-    const struct {
-        list x;
-        double mean, std, single_mean;
-    } cases[] = {{{2, 4, 4, 4, 5, 5, 7, 9}, 5.0, 2.0, 5.0},
-                 {{4, 4, 4}, 4.0, 0.0, 4.0},
-                 {{16777216, 1, 1}, 5592406.0, NAN, 5592405.5},
-                 {{}, NAN, NAN, NAN}};
-    for (const auto &c : cases) {
-        const std::vector<float> single(c.x.begin(), c.x.end());
-        const auto n = static_cast<int64_t>(c.x.size());
-        double mean = 0.0, std = 0.0;
-        float single_mean = 0.0f, single_std = 0.0f;
-        getMeanStd(c.x.data(), n, &mean, &std);
-        getfloatMeanStd(single.data(), n, &single_mean, &single_std);
-        EXPECT_TRUE(mean == c.mean || (n == 0 && std::isnan(mean)));
-        EXPECT_TRUE(static_cast<double>(single_mean) == c.single_mean ||
-                    (n == 0 && std::isnan(single_mean)));
-        EXPECT_TRUE(std::isnan(c.std) ||
-                    (std == c.std && static_cast<double>(single_std) == c.std));
-        EXPECT_EQ(std::isnan(std), n == 0);
-    }
+    const double x[] = {2, 4, 4, 4, 5, 5, 7, 9};
+    const float single[] = {2, 4, 4, 4, 5, 5, 7, 9}, large[] = {16777216, 1, 1};
+    double mean = 0.0, std = 0.0;
+    float single_mean = 0.0f, single_std = 0.0f;
+    getMeanStd(x, 8, &mean, &std);
+    getfloatMeanStd(single, 8, &single_mean, &single_std);
+    EXPECT_TRUE(mean == 5.0 && std == 2.0 && single_mean == 5.0f && single_std == 2.0f);
+    getfloatMeanStd(large, 3, &single_mean, &single_std);
+    EXPECT_EQ(single_mean, 5592405.5f);
+    getMeanStd(x, 0, &mean, &std);
+    getfloatMeanStd(single, 0, &single_mean, &single_std);
+    for (const double none : {mean, std, double{single_mean}, double{single_std}})
+        EXPECT_TRUE(std::isnan(none));
 }
