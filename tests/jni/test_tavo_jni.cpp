@@ -68,11 +68,11 @@ TEST(JniFirstCalls, EachIsHarmlessAndMakesWhatItNeeds) {
     ASSERT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), 0x10006);
 
     // The callback before init: without a host, without its method, and with both.
-    tavocallback(&info);
+    call_back_on_a_thread(info);
     EXPECT_EQ(now.log_lines, kNotAttached + kNotNotified);
     now = {"GetStaticMethodID"};
     setup();
-    tavocallback(&info);
+    call_back_on_a_thread(info);
     EXPECT_TRUE(now.events.empty());
     tavocallback(&info);
     EXPECT_EQ(now.events.size(), 1u);

@@ -157,6 +157,8 @@ TEST(ProbeMpeg, WhatIsNoHeader) {
         expect_type(2199, {zeros(1) + put(kLayer3Pair, 0, each.header)});
         expect_type(each.as_follower, {put(kLayer3Pair, 417, each.header)});
     }
+    // At the lengths that those two layers would have.
+    expect_type(2199, {pair("\xFF\xE5\x90", 1044), pair("\xFF\xE7\x90", 624)});
 }
 
 TEST(ProbeMpeg, WhereTheScanGoesOnAndEnds) {

@@ -132,7 +132,9 @@ TEST_F(Reading, ReductionsAndTheDelayOfMpegDecoders) {
 // Ogg delivers each decoded byte: 160 frames of 16,384 bytes, each sample the frame's number.
 TEST_F(Reading, TheQueueDeliversAnyPiece) {
     frames numbered;
-    for (int16_t i = 0; i < 160; ++i) numbered.push_back({samples(8192, i), 1});
+    for (int16_t i = 0; i < 160; ++i) {  // from frames that fill their buffer
+        numbered.push_back({samples(8192, i), 1, 0, 0, 1, {}, 16'384});
+    }
     open_frames(row_of("ogg"), numbered);
     EXPECT_EQ(read(0), result());
     EXPECT_EQ(scripted::call_names(), "");

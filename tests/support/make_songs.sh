@@ -112,8 +112,8 @@ for samples in 576 1024; do # the song as late as the encoders make it
   rm late.wav
 done
 
-# The brief ones are decoded in one part, the short ones in four; the long ones have a highlight that
-# is not at their start; the many have more frames than an index first has room for. 11025 Hz goes
+# The brief ones are decoded in one part, the others in four; the long ones have a highlight that is
+# not at their start; the many have more frames than an index first has room for. 11025 Hz goes
 # through the block average, 8000 Hz through the interpolator.
 folder short
 while read -r name seconds loud_at; do
@@ -124,13 +124,12 @@ while read -r name seconds loud_at; do
   convert low.wav "$name.aac" -c:a aac -b:a 24k
   oggenc --quiet -q 1 -s 1 -t 'A Title' -a 'An Artist' -o "$name.ogg" low.wav
   fragments=
-  [ "$name" != short ] || fragments='-movflags +delay_moov+default_base_moof -frag_duration 700000'
+  [ "$name" != long ] || fragments='-movflags +delay_moov+default_base_moof -frag_duration 700000'
   # shellcheck disable=SC2086 # words
   convert "$name.aac" "$name.m4a" -c copy -bsf:a aac_adtstoasc -metadata title='A Title' $fragments
   rm low.wav
 done <<END
 brief 4.5 2
-short 6 3
 long 15 8
 many 150 40
 END
