@@ -20,12 +20,13 @@ size_t below(size_t limit) {
     return limit == 0 ? 0 : random_numbers() % limit;
 }
 
-// A kept input with some bytes changed, half of the time near its start, and random choices at its
-// end; or random bytes alone.
+// A kept input, whole or cut, with some bytes changed, half of the time near its start, and random
+// choices at its end; or random bytes alone.
 bytes next_input(const std::vector<bytes> &kept) {
     const auto random_byte = [] { return static_cast<uint8_t>(random_numbers()); };
     const bool made_up = below(2) == 0;
     bytes input = made_up ? bytes(below(2000)) : kept[below(kept.size())];
+    if (below(8) == 0) input.resize(below(input.size() + 1));
     const size_t reach = below(2) == 0 ? std::min<size_t>(input.size(), 256) : input.size();
     for (size_t i = reach > 0 ? below(16) : 0; i > 0; --i) input[below(reach)] = random_byte();
     const size_t tail = std::min(input.size(), made_up ? SIZE_MAX : 1 + below(64));

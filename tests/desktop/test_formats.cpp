@@ -57,14 +57,12 @@ INSTANTIATE_TEST_SUITE_P(
     Files, Seams,
     testing::Values("cbr.mp3", "cbr48.mp3", "vbr.mp3", "vbr_no_table.mp3", "checked.mp3",
                     "mono.mp3", "lsf.mp3", "low.mp3", "layer2.mp2", "golden/layer1_44.mp1",
-                    "golden/layer1_48.mp1", "song.flac", "no_table.flac", "short_blocks.flac",
-                    "huge_blocks.flac", "mono.flac", "six.flac", "wide.flac", "noise.flac",
-                    "golden/variable.flac", "golden/late.flac", "low.aac", "noisy.aac", "high.aac",
-                    "mono.aac", "six.aac", "core.aac", "golden/he.aac", "golden/plain.adif",
-                    "last.m4a", "first.m4a", "fragmented.mp4", "video.mp4", "tagged.m4a",
-                    "layer3.mp4", "stereo3.mp4", "golden/he.m4a", "song.ogg", "other.ogg",
-                    "mono.ogg", "six.ogg", "video.ogv", "golden/late.ogg", "golden/front.ogg",
-                    "golden/end.ogg"));
+                    "golden/layer1_48.mp1", "song.flac", "no_table.flac", "mono.flac", "six.flac",
+                    "wide.flac", "noise.flac", "golden/variable.flac", "golden/late.flac",
+                    "low.aac", "high.aac", "mono.aac", "six.aac", "core.aac", "golden/he.aac",
+                    "golden/plain.adif", "last.m4a", "first.m4a", "fragmented.mp4", "video.mp4",
+                    "layer3.mp4", "stereo3.mp4", "golden/he.m4a", "song.ogg", "mono.ogg", "six.ogg",
+                    "video.ogv", "golden/late.ogg", "golden/front.ogg", "golden/end.ogg"));
 
 TEST(Files, HoldTheSameSamples) {
     const struct {
@@ -74,8 +72,6 @@ TEST(Files, HoldTheSameSamples) {
         // Without loss, whatever the blocks and with or without a table for seeking.
         {"song.flac", "song.wav"},
         {"no_table.flac", "song.wav"},
-        {"short_blocks.flac", "song.wav"},
-        {"huge_blocks.flac", "song.wav"},
         {"mono.flac", "mono.wav"},
         {"six.flac", "six.wav"},
         {"golden/late.flac", "golden/plain.flac"},
@@ -90,7 +86,6 @@ TEST(Files, HoldTheSameSamples) {
         {"first.m4a", "low.aac"},
         {"fragmented.mp4", "low.aac"},
         {"video.mp4", "low.aac"},
-        {"tagged.m4a", "low.aac"},
         {"video.ogv", "song.ogg"},
         // Of a mono stream the bare source drops nothing and averages nothing.
         {"layer3.mp4", "mono.mp3"},
@@ -127,11 +122,34 @@ samples mixed(const std::string &song, const std::string &channels) {
     return out;
 }
 
-// 24 bits at 96 kHz; and noise in blocks of 65,535 samples, which no buffer of the source can hold.
-TEST(Flac, RoundsTwentyFourBits) {
-    expect_same(read_all(fixture("wide.flac")), mixed("wide.wav", "=c0"));
-    expect_same(read_all(fixture("noise.flac")), mixed("noise.wav", "=c0"));
-    EXPECT_EQ(opened(fixture("wide.flac")).format.sample_rate, 96000);
+// Also where a new decoder starts, every few seconds, nothing is to be heard. The files have no
+// substituted noise, which differs from one decoder to the next. One is too loud for 16 bits, one
+// has blocks that no buffer of the source can hold.
+TEST(Files, ComeOutAsFfmpegDecodesThem) {
+    const struct {
+        const char *file, *like, *channels;
+        int off = 1;         // a sample may be, where the channels are mixed or the codec is lossy
+        size_t dropped = 0;  // samples, by the source
+    } files[] = {
+        {"wide.flac", "wide.wav", "=c0", 0},
+        {"noise.flac", "noise.wav", "=c0", 0},
+        {"high.aac", "high.aac", "=c0"},
+        {"loud.aac", "loud.aac", "=c0"},
+        {"six.aac", "six.aac", "=c0"},
+        {"cbr.mp3", "cbr.mp3", "<c0+c1", 1, 529},
+        {"cbr48.mp3", "cbr48.mp3", "<c0+c1"},
+        {"low.mp3", "low.mp3", "=c0"},
+        {"layer2.mp2", "layer2.mp2", "<c0+c1", 1, 529},
+        {"song.ogg", "song.ogg", "<c0+c1"},
+        {"six.ogg", "six.ogg", "<c0+c1+c2+c3+c4+c5"},
+    };
+    for (const auto &each : files) {
+        SCOPED_TRACE(each.file);
+        const samples got = read_all(fixture(each.file)), wanted = mixed(each.like, each.channels);
+        ASSERT_EQ(got.size() + each.dropped, wanted.size());
+        for (size_t i = 0; i < got.size(); ++i)
+            ASSERT_LE(std::abs(got[i] - wanted[i + each.dropped]), each.off) << i;
+    }
 }
 
 // The second channel of a pair, which the source leaves out.
@@ -163,58 +181,6 @@ TEST(Aac, LearnsTheTruthFromTheFrames) {
     const samples he = read_all(fixture("golden/he.aac"));
     for (size_t at = 256 * 2048; at < he.size(); at += 1024) {
         EXPECT_TRUE(std::any_of(&he[at], &he[at] + 1024, [](int16_t s) { return s != 0; })) << at;
-    }
-}
-
-// Where a new decoder starts, every few seconds, nothing is to be heard. These files have no
-// substituted noise, which differs from one decoder to the next. One is too loud for 16 bits.
-TEST(Aac, ComesOutAsFromOneDecoder) {
-    for (const char *name : {"high.aac", "loud.aac"}) {
-        SCOPED_TRACE(name);
-        const samples got = read_all(fixture(name)), wanted = mixed(name, "=c0");
-        ASSERT_GT(got.size(), 500U * 1024);
-        ASSERT_EQ(got.size(), wanted.size());
-        for (size_t i = 0; i < got.size(); ++i) ASSERT_LE(std::abs(got[i] - wanted[i]), 1) << i;
-    }
-}
-
-// Mean square of the difference to a channel that comes so many samples late, over a second.
-double distance(const samples &got, const samples &channel, size_t late) {
-    double sum = 0;
-    for (size_t i = 120'000; i < 164'100; ++i) {
-        const double d = got[i + late] - channel[i];
-        sum += d * d;
-    }
-    return sum / 44'100;
-}
-
-// Where loss is allowed, the right channel still comes out at the right place: at any other it is
-// farther away.
-TEST(LossyFiles, HaveTheSongInItsPlace) {
-    const struct {
-        const char *file, *song, *wanted, *other;  // the channels that come out, and others
-        size_t late;
-    } files[] = {
-        // The encoder delays by 576, the decoder by 529 of which the source drops as many.
-        {"vbr.mp3", "song.wav", "<c0+c1", "=c0", 576},
-        {"high.aac", "song48.wav", "=c0", "=c1", 1024},
-        {"mono.aac", "mono.wav", "=c0", nullptr, 1024},
-        {"six.aac", "six.wav", "=c0", "<c0+c1+c2+c3+c4+c5", 1024},
-        {"song.ogg", "song.wav", "<c0+c1", "=c0", 0},
-        {"six.ogg", "six.wav", "<c0+c1+c2+c3+c4+c5", "=c0", 0},
-    };
-    for (const auto &each : files) {
-        SCOPED_TRACE(each.file);
-        const samples got = read_all(fixture(each.file)), wanted = mixed(each.song, each.wanted);
-        EXPECT_TRUE(each.late != 0 || got.size() == wanted.size());
-        const double near = distance(got, wanted, each.late);
-        EXPECT_GT(distance(wanted, samples(wanted.size()), 0), 20 * near);
-        if (each.other != nullptr) {
-            EXPECT_GT(distance(got, mixed(each.song, each.other), each.late), 4 * near);
-        }
-        for (size_t late = each.late < 16 ? 0 : each.late - 16; late < each.late + 16; ++late) {
-            EXPECT_TRUE(late == each.late || near < distance(got, wanted, late)) << late;
-        }
     }
 }
 

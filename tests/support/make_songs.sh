@@ -40,7 +40,7 @@ song six.wav --seconds 6 --loud-at 2 --channels 6
 
 # MPEG audio
 lame --quiet -b 128 -t song.wav cbr.mp3
-lame --quiet -b 320 -h song48.wav cbr48.mp3
+lame --quiet -b 320 -h -t song48.wav cbr48.mp3
 lame --quiet -V 2 song.wav vbr.mp3
 lame --quiet -V 2 -t song.wav vbr_no_table.mp3
 lame --quiet -b 96 -p -t song.wav checked.mp3
@@ -52,8 +52,6 @@ convert song.wav layer2.mp2 -c:a mp2 -b:a 192k
 # FLAC
 flac --totally-silent -5 -o song.flac song.wav
 flac --totally-silent -5 --no-seektable -T 'TITLE=A Title' -o no_table.flac song.wav
-flac --totally-silent -5 --no-seektable -b 1152 -o short_blocks.flac song.wav
-flac --totally-silent --lax -0 -b 65535 --no-seektable -o huge_blocks.flac song.wav
 flac --totally-silent -5 -o mono.flac mono.wav
 flac --totally-silent -5 --channel-map=none -o six.flac six.wav
 convert song96.wav wide.wav -c:a pcm_s24le -af 'volume=0.77'
@@ -63,10 +61,9 @@ flac --totally-silent --lax -0 -b 65535 -o noise.flac noise.wav
 
 # AAC: the encoder uses noise substitution unless told not to, the more the lower the rate
 convert song.wav low.aac -c:a aac -b:a 128k
-convert song.wav noisy.aac -c:a aac -b:a 48k
 convert song48.wav high.aac -c:a aac -b:a 320k -aac_pns 0
 convert mono.wav mono.aac -c:a aac -b:a 64k
-convert six.wav six.aac -c:a aac -b:a 384k
+convert six.wav six.aac -c:a aac -b:a 384k -aac_pns 0
 convert song48.wav loud.aac -c:a aac -b:a 320k -aac_pns 0 -af volume=12dB # beyond full scale
 convert mono.wav core.aac -c:a aac -b:a 32k -ar 22050
 
@@ -79,14 +76,12 @@ convert low.aac fragmented.mp4 -c:a copy -bsf:a aac_adtstoasc \
 ffmpeg -nostdin -v error -f lavfi -i testsrc=size=64x64:rate=10:duration=12 video.avi
 convert video.avi video.mp4 -i low.aac -map 0:v -map 1:a -c copy -bsf:a aac_adtstoasc
 convert video.mp4 silent.mp4 -map 0:v -c copy
-convert low.aac tagged.m4a -c copy -bsf:a aac_adtstoasc -metadata title='A Title' -metadata artist='An Artist'
 convert mono.mp3 layer3.mp4 -c:a copy
 convert cbr.mp3 stereo3.mp4 -c:a copy
 convert mono.wav alac.m4a -c:a alac
 
 # Ogg
 oggenc --quiet -q 4 -s 1 -t 'A Title' -a 'An Artist' -l 'An Album' -o song.ogg song.wav
-oggenc --quiet -q 4 -s 2 -o other.ogg song22.wav
 oggenc --quiet -q 2 -s 3 -o mono.ogg mono.wav
 oggenc --quiet -q 2 -s 4 -o six.ogg six.wav
 convert video.avi video.ogv -i song.ogg -map 0:v -map 1:a -c:v libtheora -c:a copy
