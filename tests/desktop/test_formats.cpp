@@ -139,7 +139,7 @@ TEST(Files, ComeOutAsFfmpegDecodesThem) {
         {"cbr.mp3", "cbr.mp3", "<c0+c1", 1, 529},
         {"cbr48.mp3", "cbr48.mp3", "<c0+c1"},
         {"low.mp3", "low.mp3", "=c0"},
-        {"layer2.mp2", "layer2.mp2", "<c0+c1", 1, 529},
+        {"layer2.mp2", "layer2.mp2", "<c0+c1", 2, 529},
         {"song.ogg", "song.ogg", "<c0+c1"},
         {"six.ogg", "six.ogg", "<c0+c1+c2+c3+c4+c5"},
     };
