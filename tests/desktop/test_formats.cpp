@@ -60,9 +60,10 @@ INSTANTIATE_TEST_SUITE_P(
                     "golden/layer1_48.mp1", "song.flac", "no_table.flac", "mono.flac", "six.flac",
                     "wide.flac", "noise.flac", "golden/variable.flac", "golden/late.flac",
                     "low.aac", "high.aac", "mono.aac", "six.aac", "core.aac", "golden/he.aac",
-                    "golden/plain.adif", "last.m4a", "first.m4a", "fragmented.mp4", "video.mp4",
-                    "layer3.mp4", "stereo3.mp4", "golden/he.m4a", "song.ogg", "mono.ogg", "six.ogg",
-                    "video.ogv", "golden/late.ogg", "golden/front.ogg", "golden/end.ogg"));
+                    "golden/plain.adif", "last.m4a", "first.m4a", "fragmented.mp4", "fragments.mp4",
+                    "video.mp4", "layer3.mp4", "stereo3.mp4", "golden/he.m4a", "song.ogg",
+                    "mono.ogg", "six.ogg", "video.ogv", "golden/late.ogg", "golden/front.ogg",
+                    "golden/end.ogg"));
 
 TEST(Files, HoldTheSameSamples) {
     const struct {
@@ -85,6 +86,7 @@ TEST(Files, HoldTheSameSamples) {
         {"last.m4a", "low.aac"},
         {"first.m4a", "low.aac"},
         {"fragmented.mp4", "low.aac"},
+        {"fragments.mp4", "low.aac"},
         {"video.mp4", "low.aac"},
         {"video.ogv", "song.ogg"},
         // Of a mono stream the bare source drops nothing and averages nothing.
@@ -193,7 +195,7 @@ TEST(Files, MayDeliverLessThanAsked) {
         mtsrc_io io = io_for(path);
         io.path = strdup(path.c_str());  // the source's, once it is open
         io.read = [](mtsrc_file *file, void *buf, int32_t count) {
-            return mtsrc_file_read(file, buf, count > 40'000 ? count / 3 : count);
+            return mtsrc_file_read(file, buf, count > 40'000 ? 100 : count);
         };
         int32_t err = 0;
         mtsrc_ctx *source = mtsrc_open_mfal(&io, 0, &err);

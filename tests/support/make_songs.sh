@@ -75,6 +75,7 @@ convert low.aac fragmented.mp4 -c:a copy -bsf:a aac_adtstoasc \
   -movflags +delay_moov+default_base_moof -frag_duration 700000
 ffmpeg -nostdin -v error -f lavfi -i testsrc=size=64x64:rate=10:duration=12 video.avi
 convert video.avi video.mp4 -i low.aac -map 0:v -map 1:a -c copy -bsf:a aac_adtstoasc
+convert video.mp4 fragments.mp4 -c copy -movflags +delay_moov+default_base_moof -frag_duration 700000
 convert video.mp4 silent.mp4 -map 0:v -c copy
 convert mono.mp3 layer3.mp4 -c:a copy
 convert cbr.mp3 stereo3.mp4 -c:a copy
