@@ -134,7 +134,10 @@ TEST(OnsetEnvelope, HasTheBitsOfItsFramesOneByOne) {
         const std::vector<double> samples = wild_samples(n, 20 << round % 6, &random);
         std::copy(samples.begin(), samples.end(), beat->signal);
         if (round % 5 == 1) beat->signal[random() % n] = round % 2 == 0 ? NAN : INFINITY;
-        if (round % 8 == 2) beat->mel_matrix[below(256)][below(36)] = INFINITY;
+        if (round % 8 == 2) {  // what it weighs is nothing at first, and left out
+            beat->mel_matrix[below(256)][below(36)] = INFINITY;
+            std::fill_n(beat->signal, n / 2, 0.0);
+        }
         for (int32_t i = 0; i < size * 9 && round % 8 == 3; ++i)
             beat->mel_matrix[i / 18][below(36)] = static_cast<float>(below(3) - 1);
         beat->half_frame = beat->band_count = 0;
@@ -186,15 +189,20 @@ TEST(FramePair, HasTheBitsOfEachFrameAlone) {
     const working_context work(2);
     float *const *weights = work.beat.mel_matrix;
     pair_tables *tables = make_pair_tables(frame.window.data(), &frame.fft, weights, 36);
+    double one[36], other[36];
     for (int round = 0; round < 2000; ++round) {
         std::vector<double> samples = wild_samples(900, 50, &random);
         for (size_t i = 0; i < samples.size() && round % 2 == 0; ++i)
             samples[i] = cos(6.283185307179586 / 512 * static_cast<double>(i) * (round % 100));
         const double *first = samples.data(), *second = first + random() % 389;
-        double one[36], other[36];
         ASSERT_TRUE(take_pair(tables, first, second, one, other));
         ASSERT_TRUE(same_bits(one, frame.bands(first, weights))) << round;
         ASSERT_TRUE(same_bits(other, frame.bands(second, weights))) << round;
+    }
+    std::vector<double> samples(768, 1.0);
+    for (const size_t at : {767u, 0u}) {  // not finite in the second frame alone, then in both
+        samples[at] = INFINITY;
+        EXPECT_FALSE(take_pair(tables, &samples[0], &samples[256], one, other));
     }
     release_pair_tables(tables);
 }

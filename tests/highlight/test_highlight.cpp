@@ -345,6 +345,7 @@ TEST(Tune, Rises) {
     EXPECT_EQ(tuned("30 .5"), 3000u);
     EXPECT_EQ(tuned("13 0 5 .039 12 0"), 5200u);  // takes all five frames to count
     EXPECT_EQ(tuned("3 0 27 .5"), 1200u);         // from the first frame
+    EXPECT_EQ(tuned("24 0 6 .5"), 9600u);         // from the last but five
     // The first of equal rises, at frame 3, after which 6 to 7 is level.
     EXPECT_EQ(tuned("6 0 5 .5 7 0 5 .5 7 0"), 2400u);
 }
@@ -366,5 +367,5 @@ TEST(Position, CoarseThenFine) {
 // the level step after it: 109 s + 7.2 s.
 TEST(Position, TheTuningNeverReadsPastThePcm) {
     EXPECT_EQ(position(levels("116 .04 2 .64 2 .04", kRate), 200, 58), 112000u);
-    EXPECT_EQ(position(levels("116 .04 2 .64 3 .04", kRate), 200, 58), 116200u);
+    EXPECT_EQ(position(levels("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);
 }

@@ -106,15 +106,14 @@ TEST_F(from_highlight, what_is_left) {
     sources[0].report = kDuration;
     EXPECT_EQ(tavo_get_from_here(&ctx, 15'000), -2);
     EXPECT_EQ(hl.hl_pos, 20'000U);
-    EXPECT_TRUE(ctx.pcm == nullptr && ctx.ana == nullptr);
-    // The probe, four segments' buffers, the PCM; then the conversion has its own.
+    // Failing: the probe, four segments' buffers, the PCM; then the conversion has its own.
     for (int64_t nth = 0; nth < 6; ++nth) {
         decode(stream);
         sources[0].land = 0;
         fault::arm({fault::kMemory, nth});
         EXPECT_EQ(tavo_get_from_here(&ctx, 10'000), nth == 0 ? 0 : -2) << nth;
         fault::disarm();
-        EXPECT_EQ(ctx.pcm, nullptr);
+        EXPECT_TRUE(ctx.pcm == nullptr && (ctx.ana == nullptr) == (nth > 0));
         for (int i = 0; i < 4; ++i) EXPECT_EQ(ctx.seg[i].buf != nullptr, nth == 0) << nth;
     }
 }
