@@ -122,6 +122,9 @@ void visit_callback_of(TAVO_CTX *ctx) {
 TEST(Lifecycle, AJobIsNotStartedTwiceAndReleasedAfterItsCallback) {
     for_each_mode(kModes, [](int32_t, TAVO_CTX *ctx) {
         visit_callback_of(ctx);
+        fault::plan by = {fault::kThread};  // each thread finds the job running
+        by.watch = [] { EXPECT_EQ(load_flag(&visit.ctx->state), 2); };
+        fault::arm(by);
         ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
         EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -5);
         while (!visit.entered) std::this_thread::yield();
@@ -130,6 +133,7 @@ TEST(Lifecycle, AJobIsNotStartedTwiceAndReleasedAfterItsCallback) {
         EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -5);
         EXPECT_EQ(tavo_deinit(ctx), 0);
         EXPECT_TRUE(visit.left);
+        fault::disarm();
         EXPECT_TRUE(job::last.calls == 1 && job::last.status == 0);
     });
 }

@@ -129,6 +129,18 @@ TEST_F(Reading, ReductionsAndTheDelayOfMpegDecoders) {
     }
 }
 
+// The largest block, 65,535 sample pairs, decodes to twice the bytes that the queue has room for.
+TEST_F(Reading, FlacHasRoomForItsLargestBlock) {
+    samples block, expected;
+    for (size_t i = 0; i < 131'070; ++i) block.push_back(static_cast<int16_t>(i / 2));
+    for (size_t i = 0; i < 655'350; ++i) expected.push_back(block[i % 65'535 * 2]);
+    open_frames(row_of("flac"), frames(10, {block, 1}));
+    result got = read(kAll);
+    const result rest = read(kAll);
+    got.second.insert(got.second.end(), rest.second.begin(), rest.second.end());
+    EXPECT_TRUE(got == result(0, expected) && rest.first == 1);
+}
+
 // Ogg delivers each decoded byte: 160 frames of 16,384 bytes, each sample the frame's number.
 TEST_F(Reading, TheQueueDeliversAnyPiece) {
     frames numbered;

@@ -14,6 +14,7 @@ std::atomic<int64_t> count, failed;
 
 bool fails(uint32_t call) {
     if ((now.calls & call) == 0) return false;
+    if (now.watch != nullptr) now.watch();
     const int64_t place = count++;
     if (place < now.place || (place > now.place && !now.forever)) return false;
     ++failed;

@@ -31,6 +31,7 @@ struct plan {
     int64_t place = INT64_MAX;  // the one that fails, from 0, all threads counted together
     bool forever = false;       // and all later ones
     int error = EIO;            // errno of a failed file call
+    void (*watch)() = nullptr;  // runs at the start of each, failed or not
 };
 
 // From now on by this plan. No other thread of the library may run.
