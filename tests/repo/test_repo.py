@@ -1,5 +1,5 @@
-"""What the repository promises: folders include downwards only, and the library exports and asks for what it
-should. Each check is shown to fail. Arguments: the repository, the library, the list of exported names."""
+"""What the repository promises: folders include downwards only, and the library exports and takes what it should.
+Each check is shown to fail. Arguments: the repository, the library."""
 import pathlib
 import re
 import subprocess
@@ -7,7 +7,7 @@ import sys
 import tempfile
 import unittest
 
-ROOT, LIBRARY, NAMES = (pathlib.Path(sys.argv.pop(1)) for _ in range(3))
+ROOT, LIBRARY = (pathlib.Path(sys.argv.pop(1)) for _ in range(2))
 ALLOWED = {  # each folder and the floors below it that it may include
     "common": set(),
     "dsp": {"common"},
@@ -31,6 +31,11 @@ SINGLE = {  # headers that a folder may take from one it may not include otherwi
 # A codec of a package in this list would tie the library to that package.
 NEEDED = ("libwexaaudio.so", "liblog.so", "libc.so", "libm.so", "libstdc++.so", "libgcc_s.so", "libpthread.so",
           "ld-linux", "libasan.so", "libubsan.so", "libtsan.so")
+# What a library takes from the compiler and the linker, which every toolchain and sanitizer brings in its own form.
+RUNTIME = re.compile(r"_ITM_\w+|__gmon_start__|__cxa_\w+|__gxx_personality_v0|_ZSt9terminatev|_Unwind_\w+"
+                     r"|__stack_chk_\w+|__tls_\w+|__emutls_\w+|__aarch64_\w+|__(a|t|ub)san_\w+")
+# Where Android's headers or compiler name a function otherwise.
+SPELLINGS = {"__errno_location": "__errno", "bcmp": "memcmp"}
 
 
 def includes(root):
@@ -63,6 +68,17 @@ def flaws_of(library, names):
     return {*names} ^ {*exported} | foreign | storage
 
 
+def imports(library):
+    """The functions that the library takes from outside, without the codec library's."""
+    names = {line.split()[0].split("@")[0] for line in run("nm", "-Du", "--format=posix", library).splitlines()}
+    return {SPELLINGS.get(name, name) for name in names if not re.match(r"x[a-z0-9]+_", name)
+            and not RUNTIME.fullmatch(name)}
+
+
+def words_of(path):
+    return [word for line in (ROOT / path).read_text().splitlines() if line[:1] != "#" for word in line.split()]
+
+
 class Repository(unittest.TestCase):
     def test_include_directions(self):
         self.assertGreater(len([*includes(ROOT)]), 100)
@@ -82,7 +98,7 @@ class Repository(unittest.TestCase):
                 self.assertEqual(wrong_includes(pathlib.Path(folder)), [] if right else [f"{source}: {target}"])
 
     def test_exports(self):
-        names = [name for name in NAMES.read_text().split("\n") if name and not name.startswith("#")]
+        names = words_of("packaging/exports.txt")
         self.assertEqual(len(names), len(set(names)))
         self.assertEqual(flaws_of(LIBRARY, names), set())
         self.assertEqual(flaws_of(LIBRARY, {"tavo_other", *names} - {"tavo_init"}), {"tavo_other", "tavo_init"})
@@ -90,6 +106,13 @@ class Repository(unittest.TestCase):
         libc = re.search(r"\S+/libc\.so\S*", pathlib.Path("/proc/self/maps").read_text())[0]
         self.assertIn("TLS", flaws_of(libc, []))
         self.assertIn("libav", " ".join(flaws_of(LIBRARY.parent / "libwexaaudio_av.so", [])))
+
+    def test_imports(self):
+        """Android has all of them."""
+        known = words_of("tests/android/imports.txt")
+        self.assertEqual(imports(LIBRARY) - {*known}, set())
+        self.assertIn("pthread_create", imports(LIBRARY))
+        self.assertIn("dlopen", imports(LIBRARY.parent / "libwexaaudio.so") - {*known})
 
 
 if __name__ == "__main__":
