@@ -21,18 +21,13 @@ FCPXML = {  # by Final Cut Pro's DTD: where elements stand, and the attributes t
     "project/sequence/spine": "", CLIP: "ref duration", CLIP + "/marker": "start duration value"}
 
 
-def timecodes(base, dropped, count):
-    """The numbers of so many frames from one hour on, by name, counted one by one: a drop-frame timecode
-    leaves out the first names of a minute, but not of each tenth one."""
-    names = {}
-    number = 3600 * base
-    while len(names) < count:
-        second, frame = divmod(number, base)
-        if second % 60 or frame >= dropped or second // 60 % 10 == 0:
-            clock = f"{second // 3600:02}:{second // 60 % 60:02}:{second % 60:02}"
-            names[f"{clock}{';' if dropped else ':'}{frame:02}"] = len(names)
-        number += 1
-    return names
+def timecodes(base, dropped):
+    """The numbers of the frames from one hour on, by name: a drop-frame timecode leaves out the first names of a
+    minute, but not of each tenth one."""
+    places = ((minute, second, frame) for minute in range(5) for second in range(60) for frame in range(base)
+              if second or frame >= dropped or minute % 10 == 0)
+    return {f"01:{minute:02}:{second:02}{';' if dropped else ':'}{frame:02}": number
+            for number, (minute, second, frame) in enumerate(places)}
 
 
 def until_next(points):
@@ -103,7 +98,7 @@ class Markers(Case):
             path, marks = self.write("edl", "--mode beats", "--fps " + fps)
             text = path.read_text()
             self.assertTrue(text.startswith(f"TITLE: {NAME}\nFCM: {'' if dropped else 'NON-'}DROP FRAME\n"))
-            number = timecodes(base, dropped, 200 * base)
+            number = timecodes(base, dropped)
             events = re.findall(r"\n(\d{3,})  001      V     C        (\S+) (\S+) \2 \3\n"
                                 r" \|C:ResolveColor\w+ \|M:(.*) \|D:1\n", text)
             self.assertEqual([int(event[0]) for event in events], [*range(1, len(marks) + 1)])

@@ -1,8 +1,6 @@
 """The page that plays, in a real browser: Debian's Chromium without a window."""
 import os
 import pathlib
-import re
-import time
 
 from selenium import webdriver
 from selenium.webdriver.chrome.service import Service
@@ -38,8 +36,9 @@ class Report(Case):
     def find(self, selector):
         return self.browser.find_elements(By.CSS_SELECTOR, selector)
 
-    def click(self, name):
-        self.browser.find_element(By.ID, name).click()
+    def click(self, *names):
+        for name in names:
+            self.find("#" + name)[0].click()
 
     def wait(self, condition):
         WebDriverWait(self.browser, 30, 0.1).until(lambda _: self.script(f"return {condition}"))
@@ -65,15 +64,12 @@ class Report(Case):
         self.assert_plays()
 
         start = result["hl_pos_ms"]
-        self.click("gohl")
-        self.wait_for(start)
         first, second, *_ = (ms for ms in result["beats_ms"] if ms > start + 30)
-        for button, ms in (("next", first), ("next", second), ("prev", first)):
+        for button, ms in (("gohl", start), ("next", first), ("next", second), ("prev", first)):
             self.click(button)
             self.wait_for(ms)
         self.script("seek(arguments[0])", result["hl_end_ms"] - 200)
-        self.click("loop")
-        self.click("play")
+        self.click("loop", "play")
         self.wait(f"player.now() < {start + 3000}")  # past its end, back at its start
         self.wait("scheduled.length > 0")  # clicks
         self.click("play")
@@ -97,13 +93,10 @@ class Report(Case):
         for page in ("page.html", "index.html"):
             papers = []
             for width, dark in ((1200, False), (1200, True), (360, True)):
-                with self.subTest(page=page, width=width, dark=dark):
-                    self.show(page, width, dark)
-                    self.assertLessEqual(self.script("return document.documentElement.scrollWidth"), width)
-                    papers.append(self.script("return getComputedStyle(document.body).backgroundColor"))
-                    self.assertGreater(len(self.browser.get_screenshot_as_png()), 5000)
-            self.assertEqual(papers[1], papers[2])
-            self.assertNotEqual(papers[0], papers[1])
+                self.show(page, width, dark)
+                self.assertLessEqual(self.script("return document.documentElement.scrollWidth"), width, page)
+                papers.append(self.script("return getComputedStyle(document.body).backgroundColor"))
+            self.assertTrue(papers[0] != papers[1] == papers[2], (page, papers))
 
     def test_every_format_and_name_plays(self):
         for source, name in (("song.wav", b"a #1 100% <b>&.wav"), ("song.flac", b"\xff'\".flac"),
@@ -131,7 +124,7 @@ class Report(Case):
         self.show("all.html")
 
         def shown():
-            return [row.find_element(By.TAG_NAME, "td").text for row in self.find("tbody tr") if row.is_displayed()]
+            return [cell.text for cell in self.find("tbody td.name") if cell.is_displayed()]
 
         self.assertEqual(shown(), names)
         heads = self.find("thead button")

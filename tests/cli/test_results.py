@@ -5,7 +5,7 @@ import os
 import struct
 import subprocess
 
-from command_case import AS_ORDINARY_USER, LOUD_S, TAVO, Case, standard_song, wav
+from command_case import AS_ORDINARY_USER, LOUD_S, TAVO, Case, song, standard_song, wav
 
 KEYS = ["file", "mode", "status", "sample_rate", "channels", "duration_ms"]
 BEATS = ["bpm", "beat_count", "beats_ms"]
@@ -15,14 +15,12 @@ USAGE = [
     ("", "name at least one"), ("--mode all a.wav", "--mode"), ("--format xml a.wav", "--format"),
     ("--length -1 a.wav", "'-1' is not a whole number of seconds"),
     ("--length 30.5 a.wav", "'30.5' is not a whole number of seconds"),
-    ("--max-beats 99999999999 a.wav", "--max-beats"), ("-j 0 a.wav", "--jobs"),
-    ("--unknown a.wav", "--unknown"), ("-0 a.wav", "-0"), ("--output-dir . a.wav", "--format labels"),
-    ("--skip-existing a.wav", "--format labels"),
+    ("--max-beats 99999999999 a.wav", "--max-beats"), ("-j 0 a.wav", "--jobs"), ("--unknown a.wav", "--unknown"),
+    ("-0 a.wav", "-0"), ("--output-dir . a.wav", "--format labels"), ("--skip-existing a.wav", "--format labels"),
     ("--skip-existing --force -f labels a.wav", "exclude each other"),
     ("--format labels --output-dir nowhere a.wav", "nowhere"), ("--fps 25 a.wav", "edl and fcpxml"),
     ("--fps 26 -f edl a.wav", "--fps"), ("--format cue a.wav", "give both"),
-    ("--click c.wav .", "--click takes exactly one"),
-    ("--click c.wav --mode highlight a.wav", "needs beats"),
+    ("--click c.wav .", "--click takes exactly one"), ("--click c.wav --mode highlight a.wav", "needs beats"),
     ("--plot p.svg a.wav b.wav", "--plot takes exactly one"), ("--plot p.svg -", "--plot takes exactly one"),
     ("--plot p --click p a.wav", "name one file"), ("--embed a.wav", "--report"),
 ]
@@ -33,23 +31,16 @@ REFUSED = {  # content when it is a file of ours, a part of the sentence
     "movie.wma": (ASF + bytes(500), "ASF (Windows Media), a format that is refused. ffmpeg -i"),
     "24.wav": (wav(bits=24), "24-bit samples. Only 16-bit integer PCM at up to 48000 Hz is read from WAV; "
                              "ffmpeg -i FILE -c:a pcm_s16le -ar 44100 NEW.wav converts it."),
-    "float.wav": (wav(bits=32, tag=3), "32-bit floating-point"),
-    "alaw.wav": (wav(bits=8, tag=6), "format tag 6"),
+    "float.wav": (wav(bits=32, tag=3), "32-bit floating-point"), "alaw.wav": (wav(bits=8, tag=6), "format tag 6"),
     "96k.wav": (wav(rate=96000), "96000 Hz"),
-    "1s.wav": (wav(seconds=1.0), "lasts 1.000 s"),
-    "7999.wav": (wav(rate=7999), "7999 Hz"),
+    "1s.wav": (wav(seconds=1.0), "lasts 1.000 s"), "7999.wav": (wav(rate=7999), "7999 Hz"),
     "no-channels.wav": (wav(seconds=0.0)[:22] + b"\0\0" + wav()[24:], "0 channels"),
     "no-data.wav": (wav()[:36], "no usable audio stream"),
     "lies.wav": (wav(seconds=0.5, data_size=0xFFFFFFFF), "lasts 0.500 s"),
     "silence.wav": (wav(seconds=7.0, sample=b"\0"), "No beats were found"),
-    "secret.wav": (wav(), "permission denied"),
-    "closed/in.wav": (wav(), "permission denied"),
-    "closed": (None, "permission denied"),
-    "pipe": (None, "device, pipe"),
-    "/dev/zero": (None, "device, pipe"),
-    "loop": (None, "symbolic link"),
-    "empty": (None, "no audio files"),
-    "missing": (None, "does not exist"),
+    "secret.wav": (wav(), "permission denied"), "closed/in.wav": (wav(), "permission denied"),
+    "closed": (None, "permission denied"), "pipe": (None, "device, pipe"), "/dev/zero": (None, "device, pipe"),
+    "loop": (None, "symbolic link"), "empty": (None, "no audio files"), "missing": (None, "does not exist"),
 }
 
 
@@ -110,14 +101,11 @@ class Results(Case):
 
     def test_a_coarse_highlight_is_called_so(self):
         # A song too quiet for the refinement: a point of the curve with a value each 2 s.
-        loud = standard_song().read_bytes()
-        samples = memoryview(loud[44:]).cast("h")
-        self.put("quiet.wav", loud[:44] + struct.pack(f"<{len(samples)}h", *(s // 16 for s in samples)))
-        self.put("loud.wav", loud)
-        for name, refined in (("loud.wav", True), ("quiet.wav", False)):
-            (result,) = self.run_json("--mode", "highlight", name)
+        for level, refined in ((1, True), (1 / 16, False)):
+            self.put("a.wav", source=song(seconds=60, bpm=120, loud_at=LOUD_S, level=level))
+            (result,) = self.run_json("--mode", "highlight", "a.wav")
             self.assertEqual((result["hl_refined"], result["hl_pos_ms"] % 2000 != 0), (refined, refined))
-            text = self.run_tavo("--mode", "highlight", name).stdout.decode()
+            text = self.run_tavo("--mode", "highlight", "a.wav").stdout.decode()
             self.assertEqual(f"highlight  about 0:{result['hl_pos_ms'] // 1000:02}\n" in text, not refined, text)
 
     def test_refused_files(self):

@@ -87,13 +87,14 @@ class Store(Case):
 
     def test_written_out_again(self):
         names = self.put_songs(3)
-        self.run_tavo(*STORE, *names)
-        expected = self.run_json(*names)
+        self.run_tavo(*STORE, *names, "--length", "5")
+        expected = self.run_json(*names, "--length", "5")
         for name in names:
             os.unlink(self.folder / name)  # nothing is analysed
-        self.assertEqual(self.run_json(*STORE, "--from-store"), expected)
-        self.run_tavo(*STORE, "--from-store", "--format", "labels")
-        self.assertIn("highlight", (self.folder / "song 1.wav.labels.txt").read_text())
+        self.assertEqual(self.run_json(*STORE, "--from-store", "--length", "5"), expected)
+        self.run_tavo(*STORE, "--from-store", "--length", "5", "--format", "labels")
+        start, end = (expected[1][key] / 1000 for key in ("hl_pos_ms", "hl_end_ms"))
+        self.assertIn(f"{start:.6f}\t{end:.6f}\thighlight", (self.folder / "song 1.wav.labels.txt").read_text())
         self.run_tavo(*STORE, "--from-store", status=2)
 
     def test_shards(self):
