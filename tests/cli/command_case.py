@@ -5,6 +5,7 @@ import pathlib
 import struct
 import subprocess
 import tempfile
+import time
 import unittest
 
 TAVO, MAKE_SONG = os.environ["TAVO"], os.environ["MAKE_SONG"]
@@ -50,6 +51,11 @@ def seconds(text):
     return sum(float(part) * 60 ** i for i, part in enumerate(reversed(text.split(":"))))
 
 
+def send(process, text):
+    process.stdin.write(text)
+    process.stdin.flush()
+
+
 class Case(unittest.TestCase):
     def setUp(self):
         self.folder = pathlib.Path(self.enterContext(tempfile.TemporaryDirectory()))
@@ -88,6 +94,15 @@ class Case(unittest.TestCase):
                                                      **options))
         self.addCleanup(process.kill)  # runs first
         return process
+
+    def wait_until(self, condition):
+        """Returns what the condition gives once that is true."""
+        end = time.monotonic() + 60
+        while time.monotonic() < end:
+            if found := condition():
+                return found
+            time.sleep(0.02)
+        self.fail("it did not happen within a minute")
 
     def objects(self, text):
         """Each line one JSON object in strict UTF-8, NaN and the like refused."""

@@ -7,7 +7,7 @@ import subprocess
 import threading
 from urllib.parse import unquote_to_bytes
 
-from command_case import Case
+from command_case import Case, send
 
 ODD_NAMES = [
     b"two words.wav", b"line\nbreak.wav", b"tab\tand \"quotes\", comma.wav", b"caf\xc3\xa9.wav",
@@ -95,7 +95,7 @@ class Inputs(Case):
 
         def answer(names):
             """The last name answered, the command's memory in KiB."""
-            threading.Thread(target=lambda: (process.stdin.write(names), process.stdin.flush())).start()
+            threading.Thread(target=send, args=(process, names)).start()
             for _ in range(names.count(b"\n")):
                 (result,) = self.objects(process.stdout.readline())
             status = pathlib.Path(f"/proc/{process.pid}/status").read_text()

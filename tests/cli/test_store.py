@@ -5,7 +5,7 @@ import random
 import sqlite3
 import time
 
-from command_case import Case, short_song
+from command_case import Case, send, short_song
 
 KEYS = ("status", "sample_rate", "channels", "duration_ms", "hl_pos_ms", "bpm", "beats_ms")
 STORE = ("--store", "x.db")
@@ -70,6 +70,12 @@ class Store(Case):
         for i, result in enumerate(self.run_json(*names[:5])):
             for name in names[i::5]:
                 self.assert_same(rows[name.encode()], result)
+
+    def test_stored_as_time_passes(self):
+        self.put("a.wav")
+        self.run_tavo(*STORE, "a.wav")
+        send(self.start(*STORE, "-"), b"./a.wav\n")
+        self.wait_until(lambda: b"./a.wav" in self.rows())
 
     def test_a_store_that_does_not_answer(self):
         self.put("a.wav")

@@ -9,7 +9,11 @@ import subprocess
 import time
 from pathlib import Path
 
-from command_case import TAVO, Case, short_song, song, wav
+from command_case import TAVO, Case, send, short_song, song, wav
+
+
+def children(process):
+    return map(int, Path(f"/proc/{process.pid}/task/{process.pid}/children").read_text().split())
 
 
 def open_files(pid):
@@ -30,22 +34,11 @@ class Workers(Case):
     def start(self, *arguments, form="json", **options):
         return super().start("--format", form, *arguments, **options)
 
-    def wait_until(self, condition):
-        """Returns what the condition gives once that is true."""
-        end = time.monotonic() + 60
-        while time.monotonic() < end:
-            if found := condition():
-                return found
-            time.sleep(0.02)
-        self.fail("it did not happen within a minute")
-
     def worker_with(self, process, name):
         """The pid of the worker that has the file open, waited for."""
         def find():
             self.assertIsNone(process.poll(), "the command ended before its time")
-            children = Path(f"/proc/{process.pid}/task/{process.pid}/children").read_text()
-            return [child for child in map(int, children.split())
-                    if str(self.folder / name) in dict(open_files(child)).values()]
+            return [pid for pid in children(process) if str(self.folder / name) in dict(open_files(pid)).values()]
         return self.wait_until(find)[0]
 
     def assert_results(self, text, *expected):
@@ -70,6 +63,14 @@ class Workers(Case):
                                 ("././a.wav", "ok"))
             self.assertIn("signal 9", self.objects(out)[1]["error"])
             self.assertIn(b"signal 9", err)
+        process = self.start("-")  # one without a file costs none, and is told
+        send(process, b"a.wav\n")
+        self.assert_results(process.stdout.readline(), ("a.wav", "ok"))
+        os.kill(*children(process), signal.SIGKILL)
+        self.assertIn(b"without a file was ended by signal 9", process.stderr.readline())
+        out, _ = process.communicate(b"./a.wav\n")
+        self.assert_results(out, ("./a.wav", "ok"))
+        self.assertEqual(process.returncode, 1)
 
     def test_workers_end_with_the_command_and_share_no_pipes(self):
         # A pipe's end is a signal: it must not depend on another worker's life.
@@ -107,8 +108,7 @@ class Workers(Case):
         for end, status in ((lambda process: process.send_signal(signal.SIGINT), 128 + signal.SIGINT),
                             (lambda process: process.stdout.close(), 128 + signal.SIGPIPE)):
             process = self.start("-")
-            process.stdin.write(b"a.wav\n")
-            process.stdin.flush()
+            send(process, b"a.wav\n")
             self.assert_results(process.stdout.readline(), ("a.wav", "ok"))
             end(process)
             self.assertEqual(process.wait(timeout=60), status)
