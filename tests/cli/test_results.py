@@ -5,7 +5,7 @@ import os
 import struct
 import subprocess
 
-from command_case import AS_ORDINARY_USER, LOUD_S, TAVO, Case, song, standard_song, wav
+from command_case import AS_ORDINARY_USER, LOUD_S, TAVO, Case, standard_song, wav
 
 KEYS = ["file", "mode", "status", "sample_rate", "channels", "duration_ms"]
 BEATS = ["bpm", "beat_count", "beats_ms"]
@@ -101,8 +101,10 @@ class Results(Case):
 
     def test_a_coarse_highlight_is_called_so(self):
         # A song too quiet for the refinement: a point of the curve with a value each 2 s.
-        for level, refined in ((1, True), (1 / 16, False)):
-            self.put("a.wav", source=song(seconds=60, bpm=120, loud_at=LOUD_S, level=level))
+        loud = standard_song().read_bytes()
+        samples = memoryview(loud[44:]).cast("h")
+        for level, refined in ((1, True), (16, False)):
+            self.put("a.wav", loud[:44] + struct.pack(f"<{len(samples)}h", *(sample // level for sample in samples)))
             (result,) = self.run_json("--mode", "highlight", "a.wav")
             self.assertEqual((result["hl_refined"], result["hl_pos_ms"] % 2000 != 0), (refined, refined))
             text = self.run_tavo("--mode", "highlight", "a.wav").stdout.decode()
