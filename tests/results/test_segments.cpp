@@ -6,7 +6,7 @@
 
 namespace {
 
-constexpr size_t kLeastFiles = 60;  // that are long enough, of the fixtures
+constexpr size_t kLeastFiles = 50;  // that are long enough, of the fixtures
 
 TEST(Segments, GiveWhatALinearReadGives) {
     size_t compared = 0;
