@@ -23,7 +23,7 @@ bytes patched(bytes file, size_t at, uint64_t value, size_t size = 2) {
 
 TEST(Wav, ReadsEveryShapeOfHeader) {
     const samples pcm = numbers(60000);
-    const bytes file = support::wav_bytes(pcm, {});
+    const bytes file = support::wav_bytes(pcm, 44100, 2);
     const auto with_size = [&](uint64_t bytes) { return patched(file, kData + 4, bytes, 4); };
     // 22 bytes more: 16 bits in use, no speakers, PCM.
     const bytes extension = {22, 0, 16, 0, 0,    0, 0, 0,    1, 0,    0,    0,
@@ -39,8 +39,8 @@ TEST(Wav, ReadsEveryShapeOfHeader) {
         size_t channels, frames;
     } shapes[] = {
         {"plain", file, 2, 30000},
-        {"mono", support::wav_bytes(pcm, {44100, 1}), 1, 60000},
-        {"six", support::wav_bytes(pcm, {44100, 6}), 6, 10000},
+        {"mono", support::wav_bytes(pcm, 44100, 1), 1, 60000},
+        {"six", support::wav_bytes(pcm, 44100, 6), 6, 10000},
         {"extensible", joined({format, extension, part(file, kData)}), 2, 30000},
         {"odd", joined({part(file, 0, kData), chunks, part(file, kData), chunks}), 2, 30000},
         {"zero", with_size(0), 2, 30000},
@@ -62,7 +62,7 @@ TEST(Wav, ReadsEveryShapeOfHeader) {
 
 // Where the header says anything, an unusable format is told from unusable data.
 TEST(Wav, RefusesWhatTheSourceCannotUse) {
-    const bytes file = support::wav_bytes(numbers(2000), {});
+    const bytes file = support::wav_bytes(numbers(2000), 44100, 2);
     const auto coded = [&](uint64_t tag, uint64_t bits) {
         return patched(patched(file, kFormat + 8, tag), kFormat + 22, bits);
     };
@@ -87,7 +87,7 @@ TEST(Wav, RefusesWhatTheSourceCannotUse) {
 
 TEST(Wav, SeeksToWholeSeconds) {
     const samples pcm = numbers(22051);  // one sample beyond 2 s
-    const opened file(save("seek.wav", support::wav_bytes(pcm, {11025, 1})));
+    const opened file(save("seek.wav", support::wav_bytes(pcm, 11025, 1)));
     ASSERT_NE(file.source, nullptr);
     const struct {
         int64_t units, sample;

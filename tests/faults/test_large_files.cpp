@@ -13,11 +13,9 @@ constexpr int64_t kRate = 48'000;
 
 // Its last second has samples of 1000. The sizes in the header saturate.
 std::string sparse_wav(int32_t channels, int64_t seconds) {
-    support::wav_spec plan;
-    plan.rate = static_cast<int32_t>(kRate);
-    plan.channels = channels;
     const auto second = static_cast<size_t>(kRate * channels);
-    codec_test::bytes file = support::wav_bytes(std::vector<int16_t>(second, 1000), plan);
+    codec_test::bytes file =
+        support::wav_bytes(std::vector<int16_t>(second, 1000), kRate, channels);
     constexpr size_t kHead = 44;
     const int64_t data = seconds * 2 * static_cast<int64_t>(second);
     for (size_t i = 0; i < 4; ++i) {

@@ -128,7 +128,7 @@ song make_song(const song_spec &plan) {
     return made;
 }
 
-std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &plan) {
+std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t channels) {
     std::vector<uint8_t> out;
     const auto put = [&out](const char *name, std::initializer_list<size_t> numbers) {
         out.insert(out.end(), name, name + strlen(name));
@@ -137,10 +137,9 @@ std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &
         }
     };
     const size_t bytes = 2 * pcm.size();
-    const auto rate = static_cast<size_t>(plan.rate);
-    const size_t channels = static_cast<size_t>(plan.channels), frame = 2 * channels;
+    const auto hz = static_cast<size_t>(rate), count = static_cast<size_t>(channels);
     put("RIFF", {bytes + 36});
-    put("WAVEfmt ", {16, 1 | channels << 16, rate, rate * frame, frame | 16 << 16});
+    put("WAVEfmt ", {16, 1 | count << 16, hz, hz * 2 * count, 2 * count | 16 << 16});
     put("data", {bytes});
     for (const int16_t sample : pcm) {
         out.push_back(static_cast<uint8_t>(sample));
@@ -150,7 +149,7 @@ std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &
 }
 
 bool write_wav(const std::string &path, const song &what) {
-    const std::vector<uint8_t> content = wav_bytes(what.pcm, {what.plan.rate, what.plan.channels});
+    const std::vector<uint8_t> content = wav_bytes(what.pcm, what.plan.rate, what.plan.channels);
     FILE *file = fopen(path.c_str(), "wb");
     if (file == nullptr) return false;
     const bool whole = fwrite(content.data(), 1, content.size(), file) == content.size();

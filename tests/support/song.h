@@ -31,13 +31,8 @@ struct song {
 
 song make_song(const song_spec &plan);
 
-struct wav_spec {
-    int32_t rate = 44100;
-    int32_t channels = 2;
-};
-
 // A whole file of interleaved 16-bit samples, its header the canonical 44 bytes.
-std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, const wav_spec &plan);
+std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t channels);
 
 // False, with errno set, when the file cannot be written whole.
 bool write_wav(const std::string &path, const song &what);
