@@ -39,12 +39,6 @@ inline void callback(TAVO_INFO *info) {
     changed.notify_all();
 }
 
-inline void expect_none() {
-    std::lock_guard<std::mutex> guard(lock);
-    last = result{};
-    inside = nullptr;
-}
-
 inline result wait() {
     std::unique_lock<std::mutex> guard(lock);
     changed.wait(guard, [] { return last.calls > 0; });
@@ -63,8 +57,10 @@ inline const char *flaw_of(const result &found, int mode) {
     return std::all_of(list.begin(), list.end(), finite) ? nullptr : "times of the beats";
 }
 
+// No job may run: what the one before reported is forgotten.
 inline TAVO_CTX *create(const std::string &path, int32_t mode, int32_t *err = nullptr) {
-    expect_none();
+    last = {};
+    inside = nullptr;
     fnamedec = "";
     const TAVO_PARAM param = {path.c_str(), mode};
     TAVO_CTX *ctx = tavo_init(&param, err);
