@@ -16,7 +16,7 @@ std::string sparse_wav(int32_t channels, int64_t seconds) {
     const auto second = static_cast<size_t>(kRate * channels);
     codec_test::bytes file =
         support::wav_bytes(std::vector<int16_t>(second, 1000), kRate, channels);
-    constexpr size_t kHead = 44;
+    constexpr ptrdiff_t kHead = 44;
     const int64_t data = seconds * 2 * static_cast<int64_t>(second);
     for (size_t i = 0; i < 4; ++i) {
         file[40 + i] = static_cast<uint8_t>(std::min<int64_t>(data, 0xFFFFFFFF) >> 8 * i);
