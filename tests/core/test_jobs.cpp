@@ -104,6 +104,9 @@ TEST(Jobs, BeatAnalysisAloneReportsInEveryMode) {
         EXPECT_EQ(ctx->state, mode == TAVO_MODE_HIGHLIGHT ? 4 : 3);
         EXPECT_EQ(job::last.hl_pos, mode == TAVO_MODE_BOTH ? 29'980 : 0);
         beats[mode] = job::last.beats;
+        ctx->ana_len = 0;  // a second analysis, which finds nothing
+        EXPECT_EQ(analyzeOnsetenv(ctx), 0);
+        EXPECT_TRUE(job::last.status == -1 && job::last.beat_count == 0 && job::last.null_beats);
         if (mode == TAVO_MODE_HIGHLIGHT) free(signal);  // not the instance's to release there
         EXPECT_EQ(tavo_deinit(ctx), 0);
     });
