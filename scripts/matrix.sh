@@ -23,7 +23,11 @@ for line in "${builds[@]}"; do
     -DTAVO_BUILD_CLI=OFF -DTAVO_BUILD_JAVA=OFF >/dev/null
   cmake --build "$build" --target song_results >"$build.log"
   run=()
-  [[ $name != valgrind ]] || run=(valgrind --quiet --error-exitcode=99 --leak-check=full)
+  if [[ $name == valgrind ]]; then
+    # glibc's loader compares names eight bytes at a time, beyond the end of a short one.
+    printf '{\n loader\n Memcheck:Addr8\n obj:*/ld-linux*\n obj:*/ld-linux*\n}\n' >"$build.supp"
+    run=(valgrind --quiet --error-exitcode=99 --leak-check=full --suppressions="$build.supp")
+  fi
   result=identical
   "${run[@]}" "$build/bin/song_results" tests/results/songs tests/results/expected.json >>"$build.log" 2>&1 ||
     { result=different failed+=("$name"); tail -n 20 "$build.log"; }
