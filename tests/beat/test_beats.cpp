@@ -9,12 +9,13 @@
 
 #include "beat/click_track.h"
 #include "tests/beat/beat_fixture.h"
+#include "tests/support/fault_layer.h"
 
 namespace {
 
 using namespace std::string_literals;
 
-int starts_until_stop = INT32_MAX;  // thread starts, with the one at which a stop arrives
+int starts_until_stop = 0;  // thread starts, with the one at which a stop arrives
 int32_t *stop_flag = nullptr;
 
 // Drums from 0 s on, each heard until the next, no two neighbours equally loud.
@@ -51,15 +52,6 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 }  // namespace
 
-extern "C" {
-int __real_pthread_create(pthread_t *, const pthread_attr_t *, void *(*)(void *), void *);
-int __wrap_pthread_create(pthread_t *thread, const pthread_attr_t *attr, void *(*entry)(void *),
-                          void *argument) {
-    if (--starts_until_stop == 0) store_flag(stop_flag, 1);
-    return __real_pthread_create(thread, attr, entry, argument);
-}
-}
-
 // Quiet noise, then loud: the onset between them is a beat although only one is asked for and much
 // sharper onsets follow it, out of silence.
 TEST(Beats, RiseForcesABeat) {
@@ -88,13 +80,19 @@ TEST(Beats, Stop) {
         stop_flag = &of.ctx.quit;
         of.ctx.quit = c.start == 0 ? 1 : 0;
         starts_until_stop = c.start;
+        fault::arm({fault::kThread, INT64_MAX, false, EIO, [] {
+                        if (--starts_until_stop == 0) store_flag(stop_flag, 1);
+                    }});
         EXPECT_EQ(analyse_to_file(&of).empty(), !c.beats) << c.start;
         EXPECT_EQ(of.ctx.onset->beat_count > 3, c.beats) << c.start;
         EXPECT_EQ(of.ctx.onset->bpm > 0, c.tempo) << c.start;
         EXPECT_EQ(of.ctx.state, c.beats ? kStateFinished : kStateRunning) << c.start;
         EXPECT_EQ(feat_mutex_mt, nullptr);
     }
-    starts_until_stop = INT32_MAX;
+    analysis of(drum_song(120, 10));
+    fault::arm({fault::kMemory, 0});
+    EXPECT_EQ(getBeatPosition(&of.ctx), 0);
+    fault::disarm();
 }
 
 // Silence and signals too short for an envelope have 90 BPM and no beats. The file has half the

@@ -46,6 +46,7 @@ TEST(Tempo, ScoresOfKnownCorrelations) {
         // With its triple and the triple's neighbours 0.33 x 1.006; 27 has 1.313 or 1.340.
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.413}}, 95},
+        {{{20, 1}, {59, 1}, {27, 1.1}}, 129},  // 59 alone: 1.109 and 1.043
         // The share of 20 against its double, 0.533 or 0.527; the double has 64 BPM.
         {{{20, 1}, {40, 1.30}}, 129},
         {{{20, 1}, {40, 1.33}}, 64},

@@ -87,6 +87,7 @@ TEST(Dft, LengthsOutsideTheRange) {
     }
     EXPECT_EQ(tavo_inverse_dft(re.data(), im.data(), 2, -1, 0), 0);
     EXPECT_EQ(tavo_inverse_dft(re.data(), im.data(), INT64_MAX, 2, 0), -2);
+    EXPECT_EQ(tavo_dft(re.data(), im.data(), INT64_MAX, INT64_MAX, 0), -2);
     EXPECT_TRUE(re == list({1, 2}) && im == list({3, 4}));
 }
 

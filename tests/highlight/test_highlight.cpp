@@ -223,7 +223,7 @@ TEST(Search, ARequestedLengthMovesTheStart) {
     const char *plain = "10 0.25 4 0.75 16 0.25 20 1 10 0.25";
     // What passes the end begins at the first segment or the first valley, whichever is earlier, or
     // at the one there is. The dips to 0.1 are far below the rest.
-    const char *valley_first = "20 0.5 1 0.1 9 0.5 20 1 10 0.5";
+    const char *valley_first = "20 0.5 1 0.1 9 0.5 20 1 5 0.5 1 0.1 4 0.5";
     const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
     const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
     // One loud point is no segment, and two, (19, 21), are one. The region ends at 27.

@@ -68,6 +68,8 @@ TEST_F(OpenClose, RatesAndChannelsAccepted) {
 }
 
 TEST_F(OpenClose, ContainersChooseTheFirstAudioTrack) {
+    EXPECT_EQ(get_mp4_audiostream(nullptr), -1);
+    EXPECT_EQ(get_ogg_audiostream(std::make_unique<xogg_info>().get()), -1);
     for (const bool mp4 : {true, false}) {
         const source_row &row = row_of(mp4 ? "mp4 with aac" : "ogg");
         const std::vector<int32_t> none(mp4 ? 64 : 16, 2);

@@ -208,9 +208,10 @@ TEST_F(Reading, SeeksAndResets) {
 
 // The frame that is asked about is consumed.
 TEST_F(Reading, AacRateOfTheNextFrame) {
-    open_frames(row_of("aac"), {group(2), {{4, 4}, 9, 0, 0, 1, {}, 24'577}, group(6)});
+    open_frames(row_of("aac"),
+                {{{2, 2}, 9, 0, 0, 1, {}, 24'576}, {{4, 4}, 9, 0, 0, 1, {}, 24'577}, group(6)});
     EXPECT_EQ(aac_get_hz(src->demux, src->decoder), 44100);
-    const wexa_frame frame = {nullptr, 0, 16, 0, 306, 0, {}};
+    const wexa_frame frame = {nullptr, 0, 24'576, 0, 306, 0, {}};
     EXPECT_EQ(scripted::all.calls[1].records[1].substr(8), bytes_of(frame).substr(8));
     EXPECT_EQ(aac_get_hz(src->demux, src->decoder), -1);
     EXPECT_EQ(read(kAll), result(1, {6}));

@@ -135,6 +135,9 @@ TEST_F(from_highlight, comparison_reads_its_record_alone) {
         sources[0].at = landed;
         int64_t off = 43'000;
         const auto *samples = reinterpret_cast<const int16_t *>(pcm.data());
+        fault::arm({fault::kMemory, 0});
+        EXPECT_EQ(_compare_decoded(seg.get(), samples, &off), -1);
+        fault::disarm();
         EXPECT_EQ(_compare_decoded(seg.get(), samples, &off), found ? 0 : -1);
         EXPECT_EQ(off, found ? landed : 43'000);
     }

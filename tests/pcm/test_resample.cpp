@@ -64,6 +64,7 @@ TEST(resample_sinc, filter_table) {
         EXPECT_NEAR(prepared(rate)->coef[phase][tap], want, std::fabs(want) * 1.3e-7);
     }
     EXPECT_EQ(prepared(48000)->ratio, 48000.0f / 11025.0f);
+    EXPECT_EQ(prepared(7, 1)->ratio, 7.0f);
     // 88,201 / 11,025 is 0.00009 off a whole ratio, 88,202 is 0.00018.
     for (const auto &[rate, taps] : {std::pair{88201, 20}, {88202, 19}, {-48000, 19}})
         EXPECT_EQ(prepared(rate)->taps, taps) << rate;
@@ -99,7 +100,7 @@ TEST(resample_sinc, sums_by_hand) {
     EXPECT_EQ(all(3, 0, 0.5f, 0), sample_run(17, 2));
     EXPECT_EQ(all(-3, 0, 0.5f, 0), sample_run(17, -1));
     // In tap order and in single precision, 2^24 + 1 stays 2^24.
-    EXPECT_EQ(all(1, 16'777'216.0f, 1, -16'777'216.0f), sample_run(17, 0));
+    EXPECT_EQ(all(1, 16'777'216.0f, 1, -16'777'214.0f), sample_run(17, 2));
     // 5,000,000 is 76 * 65,536 + 19,264, and a thousand times as much 76,294 * 65,536 - 3584.
     EXPECT_EQ(all(5000, 0, 1000.0f, 0), sample_run(17, 19'264));
     EXPECT_EQ(all(5000, 0, 1e6f, 0), sample_run(17, -3584));
