@@ -22,6 +22,7 @@ struct envelope {
     std::vector<peak> peaks, kept_out = {};
     std::vector<int32_t> rises = {};
     int32_t max_beats = 0, plateau = 2;
+    float frame_s = static_cast<float>(kHop);
 };
 
 // The frames of the peaks behind the beats: a beat lies two hops after its frame's start.
@@ -33,6 +34,7 @@ frames place(const envelope &env) {
         beat->onset_env[p.frame] = p.height;
         std::fill_n(beat->onset_env + p.frame + 10, env.plateau, 10.0);
     }
+    beat->frame_times[0] = env.frame_s;
     beat->rise_count = static_cast<int32_t>(env.rises.size());
     beat->rise_frames = zeroed_items<int32_t>(beat->rise_count);
     std::copy(env.rises.begin(), env.rises.end(), beat->rise_frames);
@@ -66,6 +68,15 @@ TEST(Candidates, PeaksAndTheirLimit) {
         for (int64_t frame = 0; frame < 999; ++frame) env.peaks.push_back({frame, value});
         EXPECT_EQ(place(env), frames{}) << value;
     }
+}
+
+// Frames of 0.45 s: no two of the peaks are too near, and the list of them is full. The percentile
+// of any four frames is the largest value.
+TEST(Candidates, PeaksInEveryOtherFrame) {
+    envelope env = {300, 96, {}};
+    env.frame_s = 0.45f;
+    for (int64_t frame = 1; frame < 299; frame += 2) env.peaks.push_back({frame, 5});
+    EXPECT_EQ(place(env), frames{});
 }
 
 // 96 BPM: beats two periods apart, 1.25 s. From 95 BPM down at least 3 s: five periods, 3.158 s.
