@@ -131,6 +131,7 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
         numbers event;
     } cases[] = {
         {"", 0, both, kOpened, result},
+        {"", 0, {29980, 1, times.data(), 0}, kOpened, {1, 29980, 1}},
         {"", 0, {62000, 0, nullptr, 0}, kOpened, {1, 62000, 0}},
         {"", 0, {29980, 0, nullptr, -1}, kOpened, {2, 29980, 0}},
         {"", 0, {0, 120, times.data(), -1}, kOpened, {2, 0, 0}},
@@ -159,7 +160,8 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
         if (now.events.empty()) continue;
         EXPECT_NE(now.events[0].object, nullptr);
         EXPECT_EQ(now.events[0].numbers, each.event);
-        EXPECT_EQ(now.events[0].beats, each.event[2] != 0 ? std::optional(times) : std::nullopt);
+        const std::vector<float> beats(times.begin(), times.begin() + each.event[2]);
+        EXPECT_EQ(now.events[0].beats, beats.empty() ? std::nullopt : std::optional(beats));
     }
 }
 
