@@ -234,7 +234,7 @@ TEST(Files, AreFoundAmongTagsAndGarbage) {
         std::vector<bytes> pieces;
         samples wanted;
     } tagged[] = {
-        {"mp3", {id3v2, id3v2, file, ape, id3v1}, plain},
+        {"mp3", {id3v2, id3v2, part(file, 0, 30), file, ape, id3v1}, plain},  // a lone header
         {"aac", {id3v2, load(fixture("golden/plain.aac"))}, read_all(fixture("golden/plain.aac"))},
         {"flac", {id3v2, load(fixture("song.flac")), id3v1}, read_all(fixture("song.wav"))},
         {"ogg", {ogg, ogg}, read_all(fixture("golden/plain.ogg"))},  // not the second stream
