@@ -79,6 +79,13 @@ TEST(Candidates, PeaksInEveryOtherFrame) {
     EXPECT_EQ(place(env), frames{});
 }
 
+// At 40 BPM the window has 258 frames. In a song of one less, the eighth largest value is the top
+// of the line to the end: at frame 200, 73 of 129 steps up to it.
+TEST(Candidates, AWindowThatNearlyFits) {
+    EXPECT_EQ(place({257, 40, {}, {{200, 5.6}}, {}, 0, 8}), frames{});
+    EXPECT_EQ(place({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
+}
+
 // 96 BPM: beats two periods apart, 1.25 s. From 95 BPM down at least 3 s: five periods, 3.158 s.
 // A peak that the threshold keeps out comes back in gaps longer than 3 s, 129.2 frames at 120 BPM;
 // at 40 BPM 6 s are enough, 258.4 frames, though three spans are 9 s, and the window is longer.
