@@ -66,12 +66,6 @@ class Case(unittest.TestCase):
         path.write_bytes(pathlib.Path(source or short_song()).read_bytes() if content is None else content)
         return path
 
-    def put_hours_of_silence(self, name, hours):
-        """A song at 8000 Hz that takes no place on the disk."""
-        size = 2 * 8000 * 3600 * hours
-        head = wav(seconds=0, rate=8000, data_size=size)
-        os.truncate(self.put(name, head), len(head) + size)
-
     def assert_only(self, *names):
         """The folder holds these files and nothing else, hidden ones counted."""
         self.assertEqual({p.name for p in self.folder.iterdir()}, set(names))
@@ -97,8 +91,7 @@ class Case(unittest.TestCase):
 
     def wait_until(self, condition):
         """Returns what the condition gives once that is true."""
-        end = time.monotonic() + 60
-        while time.monotonic() < end:
+        for _ in range(3000):
             if found := condition():
                 return found
             time.sleep(0.02)
@@ -114,7 +107,5 @@ class Case(unittest.TestCase):
         """The results, without the time that each took."""
         results = self.objects(self.run_tavo("--format", "json", *arguments, status=status, **options).stdout)
         for result in results:
-            if result["status"] == "ok":
-                self.assertGreaterEqual(result["cpu_ms"], 0)
-            result.pop("cpu_ms", None)
+            self.assertTrue(result.pop("cpu_ms", -1) >= 0 or result["status"] != "ok", result)
         return results

@@ -1,6 +1,5 @@
 """Marker files, read by other programs or by rules that the editors publish."""
 import csv
-import itertools
 import json
 import re
 import subprocess
@@ -75,11 +74,10 @@ class Markers(Case):
             path, _ = self.write("reaper", words)
             rows = list(csv.DictReader(path.read_text().splitlines(), strict=True))
             self.assert_marks([(seconds(r["Start"]), seconds(r["End"] or r["Start"]), r["Name"]) for r in rows], marks)
-            numbers = {"R": itertools.count(1), "M": itertools.count(1)}
-            for row, (start, end, _) in zip(rows, marks):
-                kind = "R" if end > start else "M"
-                self.assertEqual(row["#"], f"{kind}{next(numbers[kind])}")
-                self.assertAlmostEqual(seconds(row["Length"] or "0"), end - start, delta=0.002)
+            regions = ["R1"] if marks[0][2] == "highlight" else []
+            self.assertEqual([r["#"] for r in rows], regions + [f"M{i}" for i in range(1, len(rows) + 1 - len(regions))])
+            self.assert_marks([(seconds(r["Length"] or "0"), r["Name"]) for r in rows],
+                              [(end - start, name) for start, end, name in marks], 0.002)
         path, marks = self.write("losslesscut", "--length 12")
         segments = [(float(a), float(b), name) for a, b, name in csv.reader(path.read_text().splitlines())]
         self.assert_marks(segments, marks[:1] + until_next([(m[0], m[2]) for m in marks[1:]]))

@@ -43,9 +43,6 @@ class Report(Case):
     def wait(self, condition):
         WebDriverWait(self.browser, 30, 0.1).until(lambda _: self.script(f"return {condition}"))
 
-    def wait_for(self, ms):
-        self.wait(f"Math.abs(player.now() - {ms}) < 1")
-
     def assert_plays(self):
         self.click("play")
         self.wait("player.playing() && player.now() > 300")
@@ -67,7 +64,7 @@ class Report(Case):
         first, second, *_ = (ms for ms in result["beats_ms"] if ms > start + 30)
         for button, ms in (("gohl", start), ("next", first), ("next", second), ("prev", first)):
             self.click(button)
-            self.wait_for(ms)
+            self.wait(f"Math.abs(player.now() - {ms}) < 1")
         self.script("seek(arguments[0])", result["hl_end_ms"] - 200)
         self.click("loop", "play")
         self.wait(f"player.now() < {start + 3000}")  # past its end, back at its start
@@ -82,7 +79,7 @@ class Report(Case):
         timeline.send_keys("0")
         self.assertTrue(self.script("return view.from === 0 && view.to === song.length_ms"))
         self.find("#beattimes button")[0].click()
-        self.wait_for(result["beats_ms"][0])
+        self.wait("Math.abs(player.now() - beats[0]) < 1")
         self.wait("document.getElementById('status').textContent.endsWith('copied.')")
         self.assertEqual(self.browser.get_log("browser"), [])
 
@@ -133,7 +130,6 @@ class Report(Case):
         heads[3].click()
         starts = {result["file"]: result.get("hl_pos_ms", 1e9) for result in results}
         self.assertEqual([starts[name] for name in shown()], sorted(starts.values()))
-        self.assertEqual(shown()[-1], names[2])
         self.find("#search")[0].send_keys("B")
         self.assertEqual(sorted(shown()), [names[0], names[2]])
         self.browser.find_element(By.LINK_TEXT, names[0]).click()

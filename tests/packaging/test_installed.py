@@ -29,10 +29,7 @@ message(STATUS "version ${tavo_VERSION}")
 
 
 def run(*command, **options):
-    done = subprocess.run([str(part) for part in command], text=True, capture_output=True, **options)
-    if done.returncode != 0:
-        raise AssertionError(f"{command}: {done.returncode}\n{done.stdout}{done.stderr}")
-    return done.stdout
+    return subprocess.run(command, check=True, text=True, stdout=subprocess.PIPE, **options).stdout
 
 
 class Installed(unittest.TestCase):
@@ -69,12 +66,11 @@ class Installed(unittest.TestCase):
                    f"-DCMAKE_PREFIX_PATH={self.prefix}")
 
     def test_documents_link_to_what_is_installed(self):
-        links = [(document, target) for document in self.documents.rglob("*.md")
+        links = [document.parent / target for document in self.documents.rglob("*.md")
                  for target in re.findall(r"\]\(([^)#\s]+)[^)]*\)", document.read_text("utf-8"))
                  if "://" not in target]
         self.assertGreater(len(links), 5)
-        for document, target in links:
-            self.assertTrue((document.parent / target).exists(), f"{document.name}: {target}")
+        self.assertEqual([link for link in links if not link.exists()], [])
 
     def test_example(self):
         build = self.folder / "build"
