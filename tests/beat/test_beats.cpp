@@ -1,14 +1,12 @@
 // Whole analyses of songs made of known beats, and the click track.
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <fstream>
-#include <iterator>
 #include <string>
 
 #include "beat/click_track.h"
 #include "tests/beat/beat_fixture.h"
+#include "tests/support/bytes.h"
 #include "tests/support/fault_layer.h"
 
 namespace {
@@ -32,14 +30,11 @@ std::vector<double> drum_song(double bpm, double seconds) {
 
 // Runs an analysis with a click track and gives the file, empty when there is none.
 std::string analyse_to_file(analysis *of) {
-    const std::string path = testing::TempDir() + "click_" + std::to_string(getpid()) + ".wav";
-    fnamedec = path.c_str();
+    const support::temporary_file file("click");
+    fnamedec = file.path.c_str();
     getBeatPosition(&of->ctx);
     fnamedec = "";
-    std::ifstream file(path, std::ios::binary);
-    std::string bytes{std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
-    unlink(path.c_str());
-    return bytes;
+    return support::contents_of(file.path);
 }
 
 constexpr size_t kBlip = 1102;  // samples, 100 ms

@@ -1,24 +1,23 @@
-// What tests of encoded files share: the files made by tests/support/make_songs.sh, pieces of
-// files, and media sources read to the end.
+// What tests of encoded files share: the files made by tests/support/make_songs.sh, and media
+// sources read to the end.
 #ifndef TAVO_TESTS_DESKTOP_CODEC_TEST_H
 #define TAVO_TESTS_DESKTOP_CODEC_TEST_H
 
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cstdint>
 #include <fstream>
-#include <iterator>
+#include <map>
 #include <string>
 #include <vector>
 
 #include "media_source/mtsrc.h"
 #include "media_source/wexaaudio.h"
+#include "tests/support/bytes.h"
 
 namespace codec_test {
 
-using bytes = std::vector<uint8_t>;
 using samples = std::vector<int16_t>;
 
 constexpr int64_t kUnits = 10'000'000;  // per second
@@ -30,41 +29,18 @@ inline std::string fixture(const std::string &name) {
 }
 
 // A file's contents; a missing or empty file fails the test.
-inline bytes load(const std::string &path) {
-    std::ifstream in(path, std::ios::binary);
-    bytes contents{std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+inline std::string load(const std::string &path) {
+    const std::string contents = support::contents_of(path);
     EXPECT_FALSE(contents.empty()) << path;
     return contents;
 }
 
 // Writes contents to a file that is the running program's own, until it ends. Returns its path.
-inline std::string save(const std::string &name, const bytes &contents) {
-    static struct files {
-        std::vector<std::string> paths;
-        ~files() {
-            std::for_each(paths.begin(), paths.end(), [](auto &each) { unlink(each.c_str()); });
-        }
-    } saved;
-    const std::string path = testing::TempDir() + "tavo_" + std::to_string(getpid()) + "_" + name;
-    std::ofstream out(path, std::ios::binary);
-    const auto size = static_cast<std::streamsize>(contents.size());
-    out.write(reinterpret_cast<const char *>(contents.data()), size);
-    EXPECT_TRUE(out.good()) << path;
-    saved.paths.push_back(path);
+inline std::string save(const std::string &name, const std::string &contents) {
+    static std::map<std::string, support::temporary_file> saved;
+    const std::string path = saved.try_emplace(name, name).first->second.path;
+    EXPECT_TRUE((std::ofstream(path, std::ios::binary) << contents << std::flush).good()) << path;
     return path;
-}
-
-// The bytes of a file in [from, to).
-inline bytes part(const bytes &file, size_t from, size_t to = SIZE_MAX) {
-    return {file.begin() + static_cast<ptrdiff_t>(from),
-            file.begin() + static_cast<ptrdiff_t>(std::min(to, file.size()))};
-}
-
-// The pieces, one behind the other.
-inline bytes joined(const std::vector<bytes> &pieces) {
-    bytes file;
-    for (const bytes &piece : pieces) file.insert(file.end(), piece.begin(), piece.end());
-    return file;
 }
 
 // A source. It is null when it could not be opened; error says why.

@@ -4,13 +4,14 @@
 
 #include <algorithm>
 #include <chrono>
-#include <cstring>
 #include <random>
 
 #include "tests/desktop/codec_test.h"
 
 namespace codec_test {
 namespace {
+
+using namespace std::string_literals;
 
 constexpr double kLongest = 10.0;             // seconds of one file
 constexpr int64_t kMostMemory = 1024 * 1024;  // KiB of the whole program
@@ -34,22 +35,20 @@ enum kind { kFlips, kZeros, kOnes, kNoise, kJunk, kTwice, kLost, kKinds };
 constexpr const char *kNames[kKinds] = {"flips", "zeros", "ones", "noise", "junk", "twice", "lost"};
 
 // The file with so many bytes damaged from at on.
-bytes damaged(const bytes &file, int kind, size_t at, size_t run, std::mt19937 *random) {
-    bytes piece = part(file, at, at + run);
-    bytes noise(piece.size());
-    for (uint8_t &byte : noise) byte = static_cast<uint8_t>((*random)());
-    const bytes behind = part(file, at + piece.size());
+std::string damaged(std::string file, int kind, size_t at, size_t run, std::mt19937 *random) {
+    std::string piece = file.substr(at, run);
+    const std::string noise = support::noise(run, (*random)());
     for (int i = 0; kind == kFlips && i < 8; ++i) {
-        uint8_t &byte = piece[(*random)() % piece.size()];
-        byte = static_cast<uint8_t>(byte ^ 1 << (*random)() % 8);
+        char &byte = piece[(*random)() % run];
+        byte = static_cast<char>(byte ^ 1 << (*random)() % 8);
     }
-    if (kind == kZeros) std::fill(piece.begin(), piece.end(), uint8_t{0});
-    if (kind == kOnes) std::fill(piece.begin(), piece.end(), uint8_t{0xFF});
+    if (kind == kZeros) piece.assign(run, '\0');
+    if (kind == kOnes) piece.assign(run, '\xFF');
     if (kind == kNoise) piece = noise;
-    if (kind == kJunk) piece = joined({noise, piece});
-    if (kind == kTwice) piece = joined({piece, piece});
+    if (kind == kJunk) piece = noise + piece;
+    if (kind == kTwice) piece += piece;
     if (kind == kLost) piece.clear();
-    return joined({part(file, 0, at), piece, behind});
+    return file.replace(at, run, piece);
 }
 
 // Reads a file to its end and again behind seeks. Where it opens, duration, positions and samples
@@ -78,15 +77,13 @@ samples read_consistently(const std::string &path, std::mt19937 *random) {
 
 // Samples at the front, or at the end, that are the same.
 size_t same_front(const samples &a, const samples &b) {
-    const size_t size = std::min(a.size(), b.size());
-    const auto end = a.begin() + static_cast<ptrdiff_t>(size);
-    return static_cast<size_t>(std::mismatch(a.begin(), end, b.begin()).first - a.begin());
+    const auto differs = std::mismatch(a.begin(), a.end(), b.begin(), b.end()).first;
+    return static_cast<size_t>(differs - a.begin());
 }
 
-size_t same_end(samples a, samples b) {
-    std::reverse(a.begin(), a.end());
-    std::reverse(b.begin(), b.end());
-    return same_front(a, b);
+size_t same_end(const samples &a, const samples &b) {
+    const auto differs = std::mismatch(a.rbegin(), a.rend(), b.rbegin(), b.rend()).first;
+    return static_cast<size_t>(differs - a.rbegin());
 }
 
 class Damage : public testing::TestWithParam<format> {};
@@ -94,24 +91,24 @@ class Damage : public testing::TestWithParam<format> {};
 TEST_P(Damage, StaysWhereItIs) {
     SCOPED_TRACE(GetParam().file);
     std::mt19937 random(2026);
-    const bytes file = load(fixture(GetParam().file));
+    const std::string file = load(fixture(GetParam().file));
     const samples whole = read_all(fixture(GetParam().file));
     for (int place = 0; place < kPlaces; ++place) {
         const size_t at = file.size() / 4 + random() % (file.size() / 4);
         // What a file that ends there has is what it has of the whole one.
-        const samples cut = read_consistently(save("cut", part(file, 0, at)), &random);
+        const samples cut = read_consistently(save("cut", file.substr(0, at)), &random);
         ASSERT_GT(cut.size(), whole.size() / 10);
         ASSERT_LT(cut.size(), whole.size() * 3 / 4);
         EXPECT_GE(same_front(cut, whole) + kSlack, cut.size()) << "cut at " << at;
         for (int kind = 0; kind < kKinds; ++kind) {
             SCOPED_TRACE(std::string(kNames[kind]) + " at " + std::to_string(at));
             const size_t run = 200 + random() % 750 * 4;
-            const bytes changed = damaged(file, kind, at, run, &random);
+            const std::string changed = damaged(file, kind, at, run, &random);
             const samples got = read_consistently(save("damaged", changed), &random);
             EXPECT_GE(same_front(got, whole) + kSlack, cut.size());
             const bool moved = kind == kJunk || kind == kTwice || kind == kLost;
             if (GetParam().end < (moved ? kAlways : kInPlace)) continue;
-            const samples rest = read_all(save("rest", part(file, 0, at + run)));
+            const samples rest = read_all(save("rest", file.substr(0, at + run)));
             EXPECT_GE(same_end(got, whole) + kRecovery, whole.size() - rest.size());
         }
     }
@@ -127,28 +124,28 @@ INSTANTIATE_TEST_SUITE_P(Formats, Damage,
 
 // Counts that say far more than the file can hold.
 TEST(Claims, OfTooMuchAreNotBelieved) {
+    const std::string kMost = "\x7F\xFF\xFF\xFF";
     const struct {
         const char *file, *behind;
         size_t at;
-        bytes value;
+        std::string value;
     } claims[] = {
-        {"first.m4a", "stsz", 12, {0x7F, 0xFF, 0xFF, 0xFF}},  // frames
-        {"first.m4a", "stsz", 8, {0, 0, 0, 1}},               // bytes of each
-        {"first.m4a", "stco", 8, {0x7F, 0xFF, 0xFF, 0xFF}},   // chunks
-        {"first.m4a", "stsc", 16, {0x7F, 0xFF, 0xFF, 0xFF}},  // frames in a chunk
-        {"fragmented.mp4", "trun", 8, {0xFF, 0xFF, 0xFF, 0xFF}},
-        {"fragmented.mp4", "trun", 4, {0, 0, 0, 0, 0xFF, 0xFF, 0xFF, 0xFF}},  // of unstated sizes
-        {"no_table.flac", "fLaC", 21, {0xF5, 0xFF, 0xFF, 0xFF, 0xFF}},        // samples
-        {"song.wav", "data", 4, {0xF0, 0xFF, 0xFF, 0xFF}},
+        {"first.m4a", "stsz", 12, kMost},       // frames
+        {"first.m4a", "stsz", 8, "\0\0\0\1"s},  // bytes of each
+        {"first.m4a", "stco", 8, kMost},        // chunks
+        {"first.m4a", "stsc", 16, kMost},       // frames in a chunk
+        {"fragmented.mp4", "trun", 8, "\xFF\xFF\xFF\xFF"},
+        {"fragmented.mp4", "trun", 4, "\0\0\0\0\xFF\xFF\xFF\xFF"s},  // of unstated sizes
+        {"no_table.flac", "fLaC", 21, "\xF5\xFF\xFF\xFF\xFF"},       // samples
+        {"song.wav", "data", 4, "\xF0\xFF\xFF\xFF"},
     };
     std::mt19937 random(3);
     for (const auto &each : claims) {
         SCOPED_TRACE(std::string(each.file) + ", " + each.behind);
-        bytes file = load(fixture(each.file));
-        const auto found =
-            std::search(file.begin(), file.end(), each.behind, each.behind + strlen(each.behind));
-        ASSERT_NE(found, file.end());
-        std::copy(each.value.begin(), each.value.end(), found + static_cast<ptrdiff_t>(each.at));
+        std::string file = load(fixture(each.file));
+        const size_t found = file.find(each.behind);
+        ASSERT_NE(found, std::string::npos);
+        file.replace(found + each.at, each.value.size(), each.value);
         const samples got = read_consistently(save("claim", file), &random);
         EXPECT_LE(got.size(), 3'000'000U);
     }

@@ -6,7 +6,6 @@
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
-#include <fstream>
 #include <thread>
 
 #include "tests/desktop/codec_test.h"
@@ -35,9 +34,7 @@ TEST(Decoder, ServesOneConfiguration) {
 }
 
 bool has_libavcodec() {
-    std::ifstream maps("/proc/self/maps");
-    const std::string all{std::istreambuf_iterator<char>(maps), std::istreambuf_iterator<char>()};
-    return all.find("libavcodec") != std::string::npos;
+    return load("/proc/self/maps").find("libavcodec") != std::string::npos;
 }
 
 // WAV and FLAC do without libavcodec; the first four sources that need it open at once. Behind

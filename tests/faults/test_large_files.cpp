@@ -14,7 +14,7 @@ constexpr int64_t kRate = 48'000;
 // Its last second has samples of 1000. The sizes in the header saturate.
 std::string sparse_wav(int32_t channels, int64_t seconds) {
     const auto second = static_cast<size_t>(kRate * channels);
-    codec_test::bytes file =
+    std::vector<uint8_t> file =
         support::wav_bytes(std::vector<int16_t>(second, 1000), kRate, channels);
     constexpr ptrdiff_t kHead = 44;
     const int64_t data = seconds * 2 * static_cast<int64_t>(second);

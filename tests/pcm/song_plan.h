@@ -4,43 +4,21 @@
 #define TAVO_TESTS_PCM_SONG_PLAN_H
 
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <cstring>
-#include <fstream>
 #include <map>
-#include <random>
-#include <string>
 #include <utility>
 #include <vector>
 
 #include "media_source/mtsrc_ctx.h"
 #include "pcm/decode.h"
 #include "pcm/resample.h"
+#include "tests/support/bytes.h"
 #include "tests/support/scripted_codec.h"
 
-using byte_run = std::vector<uint8_t>;
+using support::noise, support::slice;
 using sample_run = std::vector<int16_t>;
 using signal_run = std::vector<double>;
-
-// Bytes among which no 200 in a row occur twice.
-inline byte_run noise(int64_t bytes, uint32_t seed) {
-    byte_run run(static_cast<size_t>(bytes));
-    std::mt19937 random(seed);
-    for (auto &value : run) value = static_cast<uint8_t>(random() >> 11);
-    return run;
-}
-
-template <typename T>
-std::vector<T> slice(const std::vector<T> &run, int64_t first, int64_t end) {
-    return {run.begin() + first, run.begin() + end};
-}
-
-inline byte_run operator+(byte_run left, const byte_run &right) {
-    left.insert(left.end(), right.begin(), right.end());
-    return left;
-}
 
 // The n values of a conversion's output and the 64 cleared bytes behind them. Frees the output.
 inline signal_run taken(double *out, int64_t n) {
@@ -62,7 +40,7 @@ inline signal_run converted(const void *pcm, size_t bytes, int32_t rate) {
 
 // What a source plays once it is planned, and what it saw.
 struct player {
-    byte_run stream = {};
+    std::string stream = {};
     int64_t at = 0;               // next byte
     int64_t fail_at = INT64_MAX;  // byte from which on reads fail
     int empty_replies = 0;        // reads that bring nothing before the others do
@@ -84,7 +62,7 @@ inline int32_t play(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
     const auto end = static_cast<int64_t>(self->stream.size());
     const int64_t bytes = empty ? 0 : std::clamp<int64_t>(end - self->at, 0, want);
     std::copy_n(self->stream.data() + std::min(self->at, end), bytes,
-                static_cast<uint8_t *>(frame->data));
+                static_cast<char *>(frame->data));
     self->at += bytes;
     frame->size = static_cast<int32_t>(bytes);
     return bytes < want && !empty ? 1 : self->code;
@@ -104,10 +82,7 @@ inline int32_t move_player(mtsrc_ctx *src, int64_t position, int64_t *reached) {
 class song_plan : public testing::Test {
  protected:
     song_plan() { scripted::all = {}; }
-    ~song_plan() override {
-        release();
-        remove(path.c_str());
-    }
+    ~song_plan() override { release(); }
     void release() {
         free(ctx.ana);
         tavo_decode_deinit(&ctx);
@@ -118,14 +93,14 @@ class song_plan : public testing::Test {
         EXPECT_TRUE(scripted::all.faults.empty());
     }
     // The code of tavo_decode_init. The sources play stream from where setup moved them.
-    int32_t plan(int64_t duration, int32_t rate, const byte_run &stream = {}) {
+    int32_t plan(int64_t duration, int32_t rate, const std::string &stream = {}) {
         release();
-        std::ofstream(path) << head;
+        std::ofstream(file.path) << head;
         script.channels = 1;
         script.duration = duration;
         script.sample_rate = rate;
         scripted::all.use(script);
-        const TAVO_PARAM param = {path.c_str(), 0};
+        const TAVO_PARAM param = {file.path.c_str(), 0};
         const int32_t code = tavo_decode_init(&ctx, &param);
         for (int32_t i = 0; code == 0 && i < ctx.seg_count; ++i) {
             const TAVO_DECSEG &seg = ctx.seg[i];
@@ -136,11 +111,10 @@ class song_plan : public testing::Test {
         }
         return code;
     }
-    byte_run pcm(int64_t bytes) {
-        const auto *first = reinterpret_cast<const uint8_t *>(ctx.pcm);
-        return {first, first + bytes};
+    std::string pcm(int64_t bytes) {
+        return {reinterpret_cast<const char *>(ctx.pcm), static_cast<size_t>(bytes)};
     }
-    std::string path = testing::TempDir() + "tavo_pcm_" + std::to_string(getpid());
+    const support::temporary_file file{"pcm"};
     std::string head = "fLaC and some more";  // what recognition reads
     scripted::script script;
     player sources[4];

@@ -47,7 +47,7 @@ TEST_F(decode_plan, what_is_refused_and_how_it_is_cut) {
         }
         EXPECT_EQ(code, each.code);
         EXPECT_EQ(ctx.pcm_bytes, each.pcm_bytes);
-        EXPECT_EQ(pcm(each.pcm_bytes), byte_run(static_cast<size_t>(each.pcm_bytes), 0));
+        EXPECT_EQ(pcm(each.pcm_bytes), support::zeros(size_t(each.pcm_bytes)));
         for (int32_t i = 0; i < records; ++i) {
             const TAVO_DECSEG &seg = ctx.seg[i];
             const bool planned = i < each.segments;
@@ -94,7 +94,7 @@ class decode_run : public song_plan {
     }
     int64_t decode() { return DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes); }
 
-    byte_run stream = noise(160'000, 1);
+    std::string stream = noise(160'000, 1);
 };
 
 // A job keeps no segment. The last one starts at byte 120,000 and needs more than its skip.
@@ -137,16 +137,12 @@ TEST_F(decode_run, failure_codes_and_empty_replies) {
 }
 
 TEST_F(decode_run, seam_is_laid_at_the_last_match) {
-    const byte_run a = noise(1000, 1);
-    const byte_run b = noise(200, 2);
-    const byte_run tail = noise(500, 3);
-    const byte_run silence(3000, 0);
-    byte_run blip(200, 0);
-    blip[199] = 7;
-    const byte_run one = {9};
+    const std::string a = noise(1000, 1), b = noise(200, 2), tail = noise(500, 3);
+    const std::string silence = support::zeros(3000), blip = support::zeros(199) + "\7",
+                      one = "\x9";
     const struct {
         const char *name;
-        byte_run first, second, want;
+        std::string first, second, want;
         int64_t capacity = 80'000;
     } cases[] = {
         {"200 bytes before the end", a, slice(a, 800, 1000) + tail, a + tail},

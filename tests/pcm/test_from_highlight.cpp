@@ -17,14 +17,14 @@ using positions = std::vector<int64_t>;
 // Twenty seconds at 8000 Hz in four segments, as the job of mode 2 finds them.
 class from_highlight : public song_plan {
  protected:
-    void decode(const byte_run &played) {
+    void decode(const std::string &played) {
         ASSERT_EQ(plan(kDuration, kRate, played), 0);
         ctx.hl = &hl;
         ctx.ana_rate = kAnalysisRate;
         ASSERT_EQ(DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes), kBytes);
     }
     // The analysis signal of a highlight at pos is that of these bytes, and reported as hl_pos.
-    void expect_from(int64_t pos, const byte_run &bytes, uint32_t hl_pos) {
+    void expect_from(int64_t pos, const std::string &bytes, uint32_t hl_pos) {
         EXPECT_EQ(tavo_get_from_here(&ctx, pos), 0);
         EXPECT_EQ(ctx.pcm, nullptr);
         EXPECT_EQ(hl.hl_pos, hl_pos);
@@ -32,7 +32,7 @@ class from_highlight : public song_plan {
                   converted(bytes.data(), bytes.size(), kRate));
     }
 
-    const byte_run stream = noise(kBytes, 1);
+    const std::string stream = noise(kBytes, 1);
     TAVO_HL_CTX hl = {0, nullptr, 0, 4711};
 };
 
@@ -81,7 +81,7 @@ TEST_F(from_highlight, where_the_landing_point_is_found) {
     };
     for (const auto &each : cases) {
         SCOPED_TRACE(each.name);
-        byte_run played = stream;
+        std::string played = stream;
         for (const int64_t copy : each.copies) {
             std::copy_n(played.begin() + each.landed + kBlock, 200, played.begin() + copy);
         }
@@ -126,7 +126,7 @@ TEST_F(from_highlight, comparison_reads_its_record_alone) {
     seg->fmt.sample_rate = kRate;
     seg->src = ctx.seg[0].src;
     seg->start = 10'000'000;
-    byte_run pcm = stream;
+    std::string pcm = stream;
     for (const auto &[duration, landed, found] :
          {std::tuple{41'250'000, 50'000 - kBlock - 200, true},
           {41'250'000, 50'000 - kBlock - 199, false},

@@ -145,11 +145,11 @@ TEST(resample_run, sizes_that_give_no_length) {
 }
 
 // An instance with so many bytes of PCM, zero beyond those given.
-TAVO_CTX with_pcm(size_t size, int32_t rate, const byte_run &bytes = {}) {
+TAVO_CTX with_pcm(size_t size, int32_t rate, const std::string &bytes = {}) {
     TAVO_CTX ctx = {};
     ctx.pcm_bytes = static_cast<int64_t>(size);
     ctx.pcm = static_cast<int16_t *>(calloc(size, 1));
-    std::copy(bytes.begin(), bytes.end(), reinterpret_cast<uint8_t *>(ctx.pcm));
+    bytes.copy(reinterpret_cast<char *>(ctx.pcm), size);
     ctx.fmt.sample_rate = rate;
     ctx.ana_rate = kAnalysisRate;
     return ctx;
@@ -158,20 +158,20 @@ TAVO_CTX with_pcm(size_t size, int32_t rate, const byte_run &bytes = {}) {
 // A job's conversion gives up the PCM, may use its memory, and has the bits of the other, which
 // fuzz/stages.cpp compares with the plain form.
 TEST(resample_run, song_becomes_the_same_signal) {
-    const byte_run bytes = noise(40'003, 5);
+    const std::string bytes = noise(40'003, 5);
     for (const int32_t rate : {8000, 11025, 33075, 44100, 48000, 96000}) {
         for (const int64_t off : {0, 1, 4000, 40'001, 40'003}) {
             SCOPED_TRACE(testing::Message() << rate << " from " << off);
             TAVO_CTX ctx = with_pcm(bytes.size(), rate, bytes);
             EXPECT_EQ(convert_song(&ctx, off), 0);
             EXPECT_EQ(ctx.pcm, nullptr);
-            const byte_run rest = slice(bytes, off, 40'003);
+            const std::string rest = slice(bytes, off, 40'003);
             EXPECT_EQ(taken(ctx.ana, ctx.ana_len), converted(rest.data(), rest.size(), rate));
         }
     }
     // Where single precision rounds the places, a block may be elsewhere than its output.
     constexpr size_t kTail = 20'000;  // outputs
-    const byte_run tail = noise(kTail * 8 + 160, 6);
+    const std::string tail = noise(kTail * 8 + 160, 6);
     TAVO_CTX ctx = with_pcm(((1 << 24) + kTail) * 8, 44100);
     memcpy(ctx.pcm + ctx.pcm_bytes / 2 - tail.size() / 2, tail.data(), tail.size());
     const signal_run want = converted(ctx.pcm, size_t(ctx.pcm_bytes), 44100);
@@ -190,7 +190,7 @@ TEST(resample_run, each_allocation_fails_in_turn) {
           {22050, "eeess"}}) {        // the output first
         std::string found;
         for (int64_t nth = 0; nth < 5; ++nth) {
-            TAVO_CTX ctx = with_pcm(8000, rate, byte_run(8000, 3));
+            TAVO_CTX ctx = with_pcm(8000, rate, std::string(8000, '\3'));
             fault::arm({fault::kMemory, nth});
             const int32_t code = convert_song(&ctx, 0);
             fault::disarm();

@@ -1,0 +1,51 @@
+// Bytes in tests: strings hold them.
+#ifndef TAVO_TESTS_SUPPORT_BYTES_H
+#define TAVO_TESTS_SUPPORT_BYTES_H
+
+#include <unistd.h>
+
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <random>
+#include <string>
+
+namespace support {
+
+inline std::string zeros(size_t count) {
+    return std::string(count, '\0');
+}
+
+// Bytes among which no 200 in a row occur twice.
+inline std::string noise(size_t count, std::mt19937::result_type seed) {
+    std::string bytes(count, '\0');
+    std::mt19937 random(seed);
+    for (char &byte : bytes) byte = static_cast<char>(random() >> 11);
+    return bytes;
+}
+
+// The items of a string or vector in [first, end).
+template <typename list>
+list slice(const list &items, int64_t first, int64_t end) {
+    return {items.begin() + first, items.begin() + end};
+}
+
+inline std::string contents_of(const std::string &path) {
+    std::ifstream in(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+}
+
+// A path that is the running program's own. A file there goes with the record.
+struct temporary_file {
+    std::string path;
+
+    explicit temporary_file(const std::string &name)
+        : path(std::filesystem::temp_directory_path() /
+               ("tavo_" + std::to_string(getpid()) + "_" + name)) {}
+    ~temporary_file() { unlink(path.c_str()); }
+    temporary_file(const temporary_file &) = delete;
+};
+
+}  // namespace support
+
+#endif
