@@ -75,7 +75,7 @@ class Markers(Case):
             rows = list(csv.DictReader(path.read_text().splitlines(), strict=True))
             self.assert_marks([(seconds(r["Start"]), seconds(r["End"] or r["Start"]), r["Name"]) for r in rows], marks)
             regions = ["R1"] if marks[0][2] == "highlight" else []
-            self.assertEqual([r["#"] for r in rows], regions + [f"M{i}" for i in range(1, len(rows) + 1 - len(regions))])
+            self.assertEqual([r["#"] for r in rows], regions + [f"M{i + 1}" for i in range(len(rows) - len(regions))])
             self.assert_marks([(seconds(r["Length"] or "0"), r["Name"]) for r in rows],
                               [(end - start, name) for start, end, name in marks], 0.002)
         path, marks = self.write("losslesscut", "--length 12")

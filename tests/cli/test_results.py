@@ -13,8 +13,7 @@ ASF = bytes.fromhex("3026b2758e66cf11a6d900aa0062ce6c")
 
 USAGE = [
     ("", "name at least one"), ("--mode all a.wav", "--mode"), ("--format xml a.wav", "--format"),
-    ("--length -1 a.wav", "'-1' is not a whole number of seconds"),
-    ("--length 30.5 a.wav", "'30.5' is not a whole number of seconds"),
+    ("--length -1 a.wav", "--length"), ("--length 30.5 a.wav", "'30.5' is not a whole number of seconds"),
     ("--max-beats 99999999999 a.wav", "--max-beats"), ("-j 0 a.wav", "--jobs"), ("--unknown a.wav", "--unknown"),
     ("-0 a.wav", "-0"), ("--output-dir . a.wav", "--format labels"), ("--skip-existing a.wav", "--format labels"),
     ("--skip-existing --force -f labels a.wav", "exclude each other"),
