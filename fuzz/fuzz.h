@@ -1,6 +1,5 @@
-// What the fuzzers share. Each program takes bytes, brings them into the reach of what a caller of
-// its functions guarantees, and aborts when a result breaks what is promised. Choices are taken
-// from an input's end, so that an audio file as it is can be an input.
+// What the fuzzers share. Each program takes bytes, stays within what a caller of its functions
+// guarantees, and aborts when a promise is broken. Choices come from an input's end: a file's too.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 

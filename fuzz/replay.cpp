@@ -1,14 +1,9 @@
-// replay RUNS DIR...: gives a fuzzer's function every file in DIRs, then RUNS inputs made of their
-// pieces and of random bytes, the same ones each time. For compilers without libFuzzer, and for
-// every test run. The input of a failure is left beside the program, in a file that ends in .last.
+// replay RUNS DIR...: gives a fuzzer's function every file in DIRs, then RUNS inputs made of them,
+// the same ones each time. That of a failure is left beside the program, in a file named .last.
 #include <fcntl.h>
 
-#include <filesystem>
-#include <fstream>
-#include <iterator>
-#include <random>
-
 #include "fuzz/fuzz.h"
+#include "tests/support/bytes.h"
 
 namespace {
 
@@ -52,8 +47,8 @@ int main(int argc, char **argv) {
     std::sort(paths.begin(), paths.end());
     std::vector<bytes> kept;
     for (const auto &path : paths) {
-        std::ifstream in(path, std::ios::binary);
-        kept.emplace_back(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+        const std::string contents = support::contents_of(path);
+        kept.emplace_back(contents.begin(), contents.end());
         run(last, kept.back());
     }
     fuzz::must(!kept.empty(), "there are kept inputs");

@@ -136,10 +136,8 @@ TEST(ClickTrack, Blip) {
     EXPECT_EQ(std::count(track.begin() + 11025 + kBlip, track.end(), 0.0f), 20000 - 11025 - 1102);
 }
 
-// 100 ms are 1102.5 samples, which round to 1103. A blip cut short ends one sample before the end;
-// beats at the end or past it add nothing. 150 ms are 1653.75: a second blip ends the first. A
-// tenth of a millisecond before the start is 1.1 samples, with the half that rounds 0.6 of one,
-// which truncation takes to 0; two tenths lie a whole sample before it.
+// 100 ms are 1102.5 samples, which round to 1103; 150 ms are 1653.75. A blip cut short ends one
+// sample before the end. -0.1 ms and the half that rounds are -0.6 of a sample, truncated to 0.
 TEST(ClickTrack, Places) {
     struct piece {
         size_t at, length;  // of the blip, from its start on

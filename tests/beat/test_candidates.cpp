@@ -86,9 +86,9 @@ TEST(Candidates, AWindowThatNearlyFits) {
     EXPECT_EQ(place({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
 }
 
-// 96 BPM: beats two periods apart, 1.25 s. From 95 BPM down at least 3 s: five periods, 3.158 s.
-// A peak that the threshold keeps out comes back in gaps longer than 3 s, 129.2 frames at 120 BPM;
-// at 40 BPM 6 s are enough, 258.4 frames, though three spans are 9 s, and the window is longer.
+// 96 BPM: beats two periods apart, 1.25 s. From 95 BPM down at least 3 s: five periods, 3.158 s. A
+// gap is filled when longer than 3 s, 129.2 frames, or at 40 BPM 6 s, not three spans: 258.4
+// frames.
 TEST(Candidates, DistancesThatCount) {
     const struct {
         int32_t bpm;
@@ -104,9 +104,8 @@ TEST(Candidates, DistancesThatCount) {
     }
 }
 
-// Both rises take the peak at 300, so the beat appears twice, and 330 lies too close to it; without
-// them the stronger fills the gap. The last peak serves no rise: an ordinary one then takes the
-// place that needs no threshold.
+// Both rises take the peak at 300, to which 330 is too close; without them the stronger fills the
+// gap. The last peak serves no rise: an ordinary one takes the place that needs no threshold.
 TEST(Candidates, ARiseNeedsNoThreshold) {
     envelope env = {1000, 120, {{100, 20}, {400, 21}}, {{300, 2}, {330, 3}}};
     EXPECT_EQ(place(env), (frames{100, 330, 400}));

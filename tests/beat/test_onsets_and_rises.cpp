@@ -117,10 +117,8 @@ TEST(BeatCtx, OneSecond) {
     EXPECT_TRUE(feat_mutex_mt == nullptr && feat_cond_mt == nullptr);
 }
 
-// Songs whose workers have pairs, single frames or nothing; other sizes, which are the arguments,
-// as the context's own fields are not read; silence, which is no number; samples and weights that
-// are not finite or become so, for which the fast form gives way, and weights of either sign and
-// none.
+// Workers with pairs, single frames or nothing; sizes, which are the arguments, not the context's;
+// silence, which is no number; samples and weights not finite; weights of either sign and none.
 TEST(OnsetEnvelope, HasTheBitsOfItsFramesOneByOne) {
     std::mt19937 random(6);
     const auto below = [&](uint32_t limit) { return static_cast<int32_t>(random() % limit); };
@@ -220,9 +218,8 @@ TEST(PowerRise, Steps) {
         {kBegin + 2000, 0.5, kBegin + 1998},
         {kBegin + 3, 0.5, kBegin + 1},
         {kBlock + 2000, 0.5, kBlock + 1998},  // block 0 is never measured and counts as quiet
-        // Anything below level 1000 counts as the floor. A step to -28.03 dB (level 1300) is then
-        // too low, its limit being -32.03; one to -24.29 dB (2000) is not, and its target lies
-        // below the floor.
+        // Below level 1000 is the floor. A step to -28.03 dB (level 1300) is too low, its limit
+        // being -32.03; one to -24.29 dB (2000) is not, and its target lies below the floor.
         {kBegin + 2000, sample_of_level(1300), 0},
         {kBegin + 2000, sample_of_level(2000), kBegin},
         // Ten samples of -32768 have a mean of 32769, beyond 16 bits. The target is the top, 0 dB,

@@ -2,9 +2,7 @@
 // comes out as before.
 #include <sys/resource.h>
 
-#include <algorithm>
 #include <chrono>
-#include <random>
 
 #include "tests/desktop/codec_test.h"
 

@@ -1,8 +1,6 @@
 // What every format's reader owes, on the files of the fixtures.
-#include <algorithm>
 #include <cstdlib>
 #include <cstring>
-#include <random>
 
 #include "tests/desktop/codec_test.h"
 
@@ -13,10 +11,8 @@ using namespace std::string_literals;
 
 class Seams : public testing::TestWithParam<const char *> {};
 
-// The stream's duration is exact: the samples of a linear read. A seek to each of 40 places reports
-// the first sample at or after it, and delivers from there what a linear read delivers there. The
-// last quarter is no longer than a quarter of the duration holds, so that four parts decoded side
-// by side have the whole stream.
+// A seek reports the first sample at or after its position and delivers from there what a linear
+// read delivers. The last quarter has no more than a quarter: four parts have the whole stream.
 TEST_P(Seams, AreExact) {
     constexpr ptrdiff_t kSeamSamples = 30'000;  // compared behind each seek
     SCOPED_TRACE(GetParam());
@@ -126,9 +122,8 @@ samples mixed(const std::string &song, const std::string &channels) {
     return out;
 }
 
-// Also where a new decoder starts, every few seconds, nothing is to be heard. The files have no
-// substituted noise, which differs from one decoder to the next. One is too loud for 16 bits, one
-// has blocks that no buffer of the source can hold.
+// Also where a new decoder starts, every few seconds. The files have no substituted noise. One is
+// too loud for 16 bits, one has blocks that no buffer of the source can hold.
 TEST(Files, ComeOutAsFfmpegDecodesThem) {
     const struct {
         const char *file, *like, *channels;

@@ -2,10 +2,8 @@
 // the scans that its readers share.
 #include <dlfcn.h>
 
-#include <algorithm>
 #include <cstdlib>
 #include <cstring>
-#include <filesystem>
 #include <thread>
 
 #include "tests/desktop/codec_test.h"

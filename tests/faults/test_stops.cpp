@@ -22,11 +22,8 @@ bool stopped_after(microseconds delay, int32_t mode, bool told, bool elsewhere) 
     const bool early = told && job::last.calls == 0;
     guard.unlock();
     const auto destroy = [ctx] { EXPECT_EQ(tavo_deinit(ctx), TAVO_OK); };
-    if (elsewhere) {
-        std::thread(destroy).join();
-    } else {
-        destroy();
-    }
+    if (elsewhere) std::thread(destroy).join();
+    if (!elsewhere) destroy();
     EXPECT_EQ(job::last.calls, told ? 1 : 0);
     // Only a stop that came before the report makes a job fail, and never a highlight alone.
     EXPECT_TRUE(!told || job::last.status == 0 || (early && mode != TAVO_MODE_HIGHLIGHT));

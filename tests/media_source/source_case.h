@@ -8,19 +8,16 @@
 
 #include <algorithm>
 #include <cstring>
-#include <fstream>
 #include <sstream>
 
 #include "media_source/mtsrc_ctx.h"
+#include "tests/support/bytes.h"
 #include "tests/support/scripted_codec.h"
 
 using namespace std::string_literals;
 using samples = std::vector<int16_t>;
 using scripted::bytes_of;
-
-inline std::string zeros(size_t count) {
-    return std::string(count, '\0');
-}
+using support::zeros;
 
 inline const std::string kWavFile = "RIFF\0\0\0\0WAVEfmt "s, kMp4File = "\0\0\0\0ftyp"s + zeros(8);
 // Two Layer III frame headers at 128 kbit/s and 44,100 Hz, one frame length of 417 bytes apart.

@@ -55,8 +55,7 @@ TEST_F(Reading, FrameDecoderQueue) {
 }
 
 // One frame that is not decoded is skipped. A second in a row ends the call without a reset, as
-// failures of the reader and impossible counts do. What was queued is kept, and the next call
-// starts afresh.
+// failures of the reader and impossible counts do: what was queued is kept.
 TEST_F(Reading, FailuresAndFramesWithoutPcm) {
     for_each_row([&](const source_row &row) {
         const int32_t too_much = 1'048'575 + (row.codec == 322 ? 131'070 : 0);  // behind a frame

@@ -142,10 +142,8 @@ int32_t decode(const void *handle, const wexa_frame *compressed, wexa_output *ou
     label mark = {"", nullptr};
     if (compressed->bytes >= static_cast<int32_t>(sizeof mark)) memcpy(&mark, bytes, sizeof mark);
     status->produced = 0;
-    if (memcmp(mark.magic, label().magic, sizeof mark.magic) !=
-        0) {  // the set-up data, or a frame cut short
-        return take(output->data ? -1 : 0);
-    }
+    // The set-up data, or a frame cut short.
+    if (strncmp(mark.magic, label().magic, 8) != 0) return take(output->data ? -1 : 0);
     const frame &now = *mark.of;
     const int32_t result = take(now.decode);
     if (result != 0) return result;

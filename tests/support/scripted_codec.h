@@ -1,6 +1,5 @@
 // A codec library that does what a test tells it and writes down how it was called. Linked into a
 // test program, its functions come before those of libwexaaudio.so, so libtavo.so calls these.
-//
 // A script describes one file: what its information records say and the frames that every reader
 // of it hands out, each with the PCM that its decoding gives. All readers play the script from its
 // start, each at its own place. Any thread may call; a test looks at all while none does.
