@@ -1,5 +1,5 @@
-// What the fuzzers share. Each program takes bytes, stays within what a caller of its functions
-// guarantees, and aborts when a promise is broken. Choices come from an input's end: a file's too.
+// What the fuzzers share. Each brings bytes into the reach of what a caller guarantees and aborts
+// at a broken promise. Choices come from an input's end, so that an audio file can be an input.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 

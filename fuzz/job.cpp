@@ -7,17 +7,15 @@ namespace {
 
 using fuzz::must;
 
-// Clicks over a quiet noise, as 16-bit samples and as any other bytes.
-std::vector<uint8_t> padding(size_t bytes) {
-    std::vector<uint8_t> pad(bytes);
+// Appends clicks over a quiet noise, as 16-bit samples and as any other bytes.
+void pad(std::vector<uint8_t> *song, size_t bytes) {
     uint32_t noise = 1;
-    for (size_t i = 0; i + 1 < bytes; i += 2) {
+    for (size_t i = 0; i < bytes; i += 2) {
         noise = noise * 1664525u + 1013904223u;
         const bool loud = i / 8192 % 5 >= 2 && i % 8192 < 600;
-        pad[i] = static_cast<uint8_t>(noise >> 24);
-        pad[i + 1] = static_cast<uint8_t>(loud ? noise >> 16 : 0);
+        song->push_back(static_cast<uint8_t>(noise >> 24));
+        song->push_back(static_cast<uint8_t>(loud ? noise >> 16 : 0));
     }
-    return pad;
 }
 
 void analyse(TAVO_CTX *tavo, int32_t mode, fuzz::input *in) {
@@ -44,8 +42,7 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     const int32_t mode = in.ConsumeIntegralInRange(0, 2);
     const auto pads = in.ConsumeBool() ? in.ConsumeIntegralInRange<size_t>(0, 255) : 0;
     std::vector<uint8_t> song(data, data + size);
-    const std::vector<uint8_t> pad = padding(1024 * pads);
-    song.insert(song.end(), pad.begin(), pad.end());
+    pad(&song, 1024 * pads);
     const std::string path = fuzz::file_of(song);
     int32_t err = INT32_MIN;
     TAVO_CTX *tavo = job::create(path, mode, &err);

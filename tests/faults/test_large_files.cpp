@@ -1,6 +1,6 @@
 // WAV files beyond 2 and 4 GiB, nearly all of them holes: positions and lengths of more than 31 and
 // 32 bits. Their jobs, which read all of it, run with TAVO_FAULTS=all and take 10 GiB of memory.
-#include <fcntl.h>
+#include <cstring>
 
 #include "tests/desktop/codec_test.h"
 #include "tests/support/job_harness.h"
@@ -18,14 +18,13 @@ std::string sparse_wav(int32_t channels, int64_t seconds) {
         support::wav_bytes(std::vector<int16_t>(second, 1000), kRate, channels);
     constexpr ptrdiff_t kHead = 44;
     const int64_t data = seconds * 2 * static_cast<int64_t>(second);
-    for (size_t i = 0; i < 4; ++i) {
-        file[40 + i] = static_cast<uint8_t>(std::min<int64_t>(data, 0xFFFFFFFF) >> 8 * i);
-    }
+    const auto shown = static_cast<uint32_t>(std::min<int64_t>(data, UINT32_MAX));
+    memcpy(&file[40], &shown, sizeof shown);
     const std::string path = codec_test::save("sparse.wav", {file.begin(), file.begin() + kHead});
-    const int fd = open(path.c_str(), O_WRONLY);
-    const auto size = static_cast<ssize_t>(2 * second);
-    EXPECT_EQ(pwrite(fd, file.data() + kHead, 2 * second, kHead + data - size), size);
-    close(fd);
+    const int64_t size = 2 * static_cast<int64_t>(second);
+    std::fstream out(path, std::ios::in | std::ios::out | std::ios::binary);
+    out.seekp(kHead + data - size).write(reinterpret_cast<char *>(&file[kHead]), size);
+    EXPECT_TRUE(out.flush().good());
     return path;
 }
 

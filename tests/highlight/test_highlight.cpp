@@ -1,7 +1,5 @@
-// The loudness curve, the search on it, the region, the tuning: on curves drawn by hand, and on PCM
-// of constant levels whose loudness can be reckoned. Both are given as pairs of how many places
-// have which value. The largest of a curve's points (2 s each) is 1, so the normalised values are
-// these.
+// Curves drawn by hand and PCM of constant levels, given as pairs of how many places have which
+// value. The largest of a curve's points (2 s each) is 1, so the normalised values are these.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -328,10 +326,9 @@ TEST(Tune, StartsThatAreLeftAlone) {
     }
 }
 
-// Frame k covers steps k to k + 2. A step to square c at step s: the rise at frame s - 3 is (c/3 +
-// 2c/3
-// + 3c) / 5 = 0.8 c on average, about 3.47 c dB, and counts above 0.13; after it the first of the
-// two equal steps of 0 is taken.
+// Frame k covers steps k to k + 2. A step to square c at step s: the rise at frame s - 3 is on
+// average (c/3 + 2c/3 + 3c) / 5 = 0.8 c, about 3.47 c dB, and counts above 0.13; after it the first
+// of the two equal steps of 0 is taken.
 TEST(Tune, Rises) {
     // Mean squares from frame 10 on: 0, 0.2, 0.3, 0.3, 0.2, 0.3, 0.3, 0.2, 0, so the largest rise
     // is at 10, and the only fall of its five steps leads from 13 to 14.

@@ -4,7 +4,6 @@
 #define TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cstring>
@@ -65,13 +64,12 @@ inline const source_row &row_of(const std::string &name) {
 }
 
 struct SourceTest : testing::Test {
-    std::string path = testing::TempDir() + "tavo_source_" + std::to_string(getpid());
+    support::temporary_file file{"source"};
     mtsrc_ctx *src = nullptr;
     int32_t err = 77;
 
     ~SourceTest() override {
         close_source();
-        unlink(path.c_str());
         EXPECT_TRUE(scripted::all.faults.empty()) << scripted::all.faults[0];
         scripted::all = {};
     }
@@ -93,8 +91,8 @@ struct SourceTest : testing::Test {
         return err;
     }
     int32_t open_bytes(const std::string &content) {
-        std::ofstream(path) << content;
-        return open_path(path);
+        std::ofstream(file.path) << content;
+        return open_path(file.path);
     }
     int32_t open_row(const source_row &row, scripted::script plan = {}) {
         if (row.tag != 0 && !plan.codec) plan.codec = row.tag;

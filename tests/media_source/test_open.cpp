@@ -144,7 +144,7 @@ TEST_F(OpenClose, WithoutAHandleAProbeFileOrTheMark) {
 TEST_F(OpenClose, PathsAndFiles) {
     const mtsrc_param no_path = {nullptr};
     EXPECT_TRUE(mtsrc_init(&no_path, &err) == nullptr && err == -4);
-    EXPECT_EQ(open_path(path), -7);
+    EXPECT_EQ(open_path(file.path), -7);
     EXPECT_EQ(open_path(testing::TempDir()), -6);  // a directory opens, but cannot be read
     EXPECT_EQ(open_bytes(zeros(15)), -6);
     for (const std::string &refused : {zeros(100), kAsf}) EXPECT_EQ(open_bytes(refused), -3);
@@ -152,6 +152,7 @@ TEST_F(OpenClose, PathsAndFiles) {
                                      "\xFF\xFD\xA4" + zeros(573) + "\xFF\xFD\xA4\0"s}) {
         EXPECT_TRUE(open_bytes(layer) == 0 && src->codec == 305);  // Layers I and II
     }
+    std::string &path = file.path;
     const std::string longest = path.insert(path.rfind('/'), 511 - path.size(), '/');
     EXPECT_EQ(open_path(longest), 0);
     EXPECT_EQ(open_path("/" + longest), -3);
