@@ -9,7 +9,7 @@ import time
 import unittest
 
 TAVO, MAKE_SONG = os.environ["TAVO"], os.environ["MAKE_SONG"]
-LOUD_S = 20.0
+SONGS = pathlib.Path(os.environ["SONGS"], "formats")  # one song in every format
 
 _songs = tempfile.TemporaryDirectory()
 
@@ -24,7 +24,7 @@ def song(**options):
 
 
 def standard_song():
-    return song(seconds=60, bpm=120, loud_at=LOUD_S)
+    return song(seconds=60, bpm=120, loud_at=20)
 
 
 def short_song(seed=1):

@@ -1,10 +1,6 @@
 """The same song gives the same result in every format, up to what its encoder changes."""
-import os
-import pathlib
+from command_case import SONGS, Case
 
-from command_case import Case
-
-SONGS = pathlib.Path(os.environ["SONGS"], "formats")
 # An encoder's delay moves the song between the frames of the analysis, which moves beats by a frame of
 # 23 ms either way. So an encoded song is compared with one that has lost nothing and comes as late.
 LATE = {"constant.mp3": "late_576.flac", "variable.mp3": "late_576.flac", "variable_bare.mp3": "late_576.flac",

@@ -1,15 +1,13 @@
 """The page that plays, in a real browser: Debian's Chromium without a window."""
 import os
-import pathlib
 
 from selenium import webdriver
 from selenium.webdriver.chrome.service import Service
 from selenium.webdriver.common.by import By
 from selenium.webdriver.support.ui import WebDriverWait
 
-from command_case import Case, short_song, standard_song
+from command_case import SONGS, Case, short_song, standard_song
 
-SONGS = pathlib.Path(os.environ["SONGS"]) / "formats"  # one song in every format
 ARGUMENTS = """--headless=new --no-sandbox --disable-gpu --disable-quic --no-first-run --disable-background-networking
     --disable-component-update --disable-sync --disable-dev-shm-usage --mute-audio"""
 

@@ -1,12 +1,12 @@
 """The man page and the completions know the options that the command has, and no others."""
+import os
 import pathlib
 import re
 import subprocess
-import sys
 import tempfile
 import unittest
 
-TAVO, PACKAGING = (pathlib.Path(sys.argv.pop(1)).resolve() for _ in range(2))
+TAVO, PACKAGING = (pathlib.Path(os.environ[name]) for name in ("TAVO", "PACKAGING"))
 PAGE, BASH, ZSH, FISH = (PACKAGING / f"tavo.{end}" for end in ("1", "bash", "zsh", "fish"))
 OPTION = re.compile(r"(?<![\w-])(--[a-z][a-z-]*|-[a-zA-Z0-9])(?![\w-])")
 
@@ -66,7 +66,3 @@ class Papers(unittest.TestCase):
                     (["--jobs", ""], []), (["--output-dir", ""], ["music"]), (["a"], ["a song.wav"]),
                     (["--", "-"], ["-odd.wav"]), (["--force", ""], ["-odd.wav", "a song.wav", "music"])):
                 self.assertEqual(complete(*words, folder=folder), offered, words)
-
-
-if __name__ == "__main__":
-    unittest.main()
