@@ -2,7 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <string>
+#include <tuple>
 
 #include "beat/click_track.h"
 #include "tests/beat/beat_fixture.h"
@@ -66,22 +66,19 @@ TEST(Beats, RiseForcesABeat) {
 // Four threads take the envelope. A stop before it leaves the tempo alone, one that arrives with it
 // is seen after the tempo, and with the threshold's threads it is too late.
 TEST(Beats, Stop) {
-    const struct {
-        int start;
-        bool tempo, beats;
-    } cases[] = {{0, false, false}, {1, true, false}, {5, true, true}};
-    for (const auto &c : cases) {
+    for (const auto &[start, tempo, beats] :
+         {std::tuple{0, false, false}, {1, true, false}, {5, true, true}}) {
         analysis of(drum_song(120, 10));
         stop_flag = &of.ctx.quit;
-        of.ctx.quit = c.start == 0 ? 1 : 0;
-        starts_until_stop = c.start;
+        of.ctx.quit = start == 0 ? 1 : 0;
+        starts_until_stop = start;
         fault::arm({fault::kThread, INT64_MAX, false, EIO, [] {
                         if (--starts_until_stop == 0) store_flag(stop_flag, 1);
                     }});
-        EXPECT_EQ(analyse_to_file(&of).empty(), !c.beats) << c.start;
-        EXPECT_EQ(of.ctx.onset->beat_count > 3, c.beats) << c.start;
-        EXPECT_EQ(of.ctx.onset->bpm > 0, c.tempo) << c.start;
-        EXPECT_EQ(of.ctx.state, c.beats ? kStateFinished : kStateRunning) << c.start;
+        EXPECT_EQ(analyse_to_file(&of).empty(), !beats) << start;
+        EXPECT_EQ(of.ctx.onset->beat_count > 3, beats) << start;
+        EXPECT_EQ(of.ctx.onset->bpm > 0, tempo) << start;
+        EXPECT_EQ(of.ctx.state, beats ? kStateFinished : kStateRunning) << start;
         EXPECT_EQ(feat_mutex_mt, nullptr);
     }
     analysis of(drum_song(120, 10));

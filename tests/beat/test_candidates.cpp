@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <tuple>
 
 #include "beat/candidates.h"
 #include "tests/beat/beat_fixture.h"
@@ -90,17 +91,14 @@ TEST(Candidates, AWindowThatNearlyFits) {
 // gap is filled when longer than 3 s, 129.2 frames, or at 40 BPM 6 s, not three spans: 258.4
 // frames.
 TEST(Candidates, DistancesThatCount) {
-    const struct {
-        int32_t bpm;
-        int64_t distance, middle;
-        size_t beats;
-    } cases[] = {{96, 52, 0, 1},    {96, 53, 0, 2},    {95, 134, 0, 1},   {95, 135, 0, 2},
-                 {120, 129, 50, 2}, {120, 130, 50, 3}, {40, 258, 129, 2}, {40, 259, 129, 3}};
-    for (const auto &c : cases) {
-        envelope env = {1200, c.bpm, {{300, 20}, {300 + c.distance, 21}}};
-        if (c.middle > 0) env.kept_out = {{300 + c.middle, 2}};
+    const std::tuple<int32_t, int64_t, int64_t, size_t> cases[] = {
+        {96, 52, 0, 1},    {96, 53, 0, 2},    {95, 134, 0, 1},   {95, 135, 0, 2},
+        {120, 129, 50, 2}, {120, 130, 50, 3}, {40, 258, 129, 2}, {40, 259, 129, 3}};
+    for (const auto &[bpm, distance, middle, beats] : cases) {
+        envelope env = {1200, bpm, {{300, 20}, {300 + distance, 21}}};
+        if (middle > 0) env.kept_out = {{300 + middle, 2}};
         env.plateau = 15;
-        EXPECT_EQ(place(env).size(), c.beats) << c.bpm << " BPM, " << c.distance << " frames";
+        EXPECT_EQ(place(env).size(), beats) << bpm << " BPM, " << distance << " frames";
     }
 }
 

@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <tuple>
+
 #include "beat/tempo.h"
 #include "tests/beat/beat_fixture.h"
 
@@ -66,30 +68,25 @@ TEST(Tempo, ScoresOfKnownCorrelations) {
 // The last minute decides, in a song of more than two minutes the second one: frames 2583 to 5166
 // of 7750, 416 to 2999 of 3000. A pair that counts, 20 frames apart, outweighs the other.
 TEST(Tempo, OneMinuteDecides) {
-    const struct {
-        size_t frames, first;
-        int32_t bpm;
-    } cases[] = {{7750, 2583, 129}, {7750, 2582, 95}, {7750, 5146, 129},
-                 {7750, 5147, 95},  {3000, 416, 129}, {3000, 415, 95}};
-    for (const auto &c : cases)
-        EXPECT_EQ(tempo_of(std::vector<double>(c.frames), {{2900, 27, 0.5}, {c.first, 20, 1.0}}),
-                  c.bpm)
-            << c.first;
+    const std::tuple<size_t, size_t, int32_t> cases[] = {{7750, 2583, 129}, {7750, 2582, 95},
+                                                         {7750, 5146, 129}, {7750, 5147, 95},
+                                                         {3000, 416, 129},  {3000, 415, 95}};
+    for (const auto &[length, first, bpm] : cases) {
+        const std::vector<double> silence(length);
+        EXPECT_EQ(tempo_of(silence, {{2900, 27, 0.5}, {first, 20, 1.0}}), bpm) << first;
+    }
 }
 
 // Pulses every p frames correlate at p and 2p nearly the same, so the prior decides: p up to about
 // 144 BPM, else 2p. No period, as in silence, is 90 BPM, and above every tempo to calc_bpm_acf.
 TEST(Tempo, ShortExcerpts) {
-    const struct {
-        size_t length, period;
-        int32_t bpm;
-    } cases[] = {{1290, 20, 129},  // half a minute
-                 {42, 20, 129},    // a second: more lags than the transform has values
-                 {10, 4, 80}};     // the circle of 16 correlates best; 161 BPM, so 32 frames
-    for (const auto &c : cases) {
-        std::vector<double> env(c.length);
-        for (size_t i = 0; i < c.length; i += c.period) env[i] = 1.0;
-        EXPECT_EQ(tempo_of(env), c.bpm) << c.length << " frames, period " << c.period;
+    for (const auto &[length, period, bpm] :
+         {std::tuple{1290u, 20u, 129},  // half a minute
+          {42u, 20u, 129},              // a second: more lags than the transform has values
+          {10u, 4u, 80}}) {             // the circle of 16 correlates best; 161 BPM, so 32 frames
+        std::vector<double> env(length);
+        for (size_t i = 0; i < length; i += period) env[i] = 1.0;
+        EXPECT_EQ(tempo_of(env), bpm) << length << " frames, period " << period;
     }
     for (const double odd_one : {0.0, double{NAN}, double{INFINITY}}) {
         std::vector<double> env(64);

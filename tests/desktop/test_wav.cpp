@@ -95,16 +95,15 @@ TEST(Wav, SeeksToWholeSeconds) {
     const samples pcm = numbers(22051);  // one sample beyond 2 s
     const opened file(save("seek.wav", wav(pcm, 11025, 1)));
     ASSERT_NE(file.source, nullptr);
-    const struct {
-        int64_t units, sample;
-    } landings[] = {{19'999'999, 11025}, {0, 0},          {20'000'000, 22050}, {30'000'000, 22051},
-                    {INT64_MAX, 22051},  {-50'000'000, 0}};
-    for (const auto &each : landings) {
-        SCOPED_TRACE(each.units);
+    const std::pair<int64_t, int64_t> landings[] = {{19'999'999, 11025}, {0, 0},
+                                                    {20'000'000, 22050}, {30'000'000, 22051},
+                                                    {INT64_MAX, 22051},  {-50'000'000, 0}};
+    for (const auto &[units, sample] : landings) {
+        SCOPED_TRACE(units);
         int64_t reached = -1;
-        ASSERT_EQ(mtsrc_seekstream(file.source, each.units, &reached), 0);
-        EXPECT_EQ(reached * 11025 / kUnits, each.sample);
-        expect_same(read(file.source), {pcm.begin() + each.sample, pcm.end()});
+        ASSERT_EQ(mtsrc_seekstream(file.source, units, &reached), 0);
+        EXPECT_EQ(reached * 11025 / kUnits, sample);
+        expect_same(read(file.source), {pcm.begin() + sample, pcm.end()});
     }
 }
 

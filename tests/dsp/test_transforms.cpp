@@ -92,16 +92,13 @@ TEST(Dft, LengthsOutsideTheRange) {
 }
 
 TEST(Mel, BothWays) {
-    const struct {
-        float hz, mel;
-    } cases[] = {{0.0f, 0.0f},          {500.0f, 7.499996f},   {999.9f, 14.998492f},
-                 {1000.0f, 15.0f},      {2000.0f, 25.077812f}, {5512.0f, 39.817379f},
-                 {11025.0f, 49.896507f}};
-    for (const auto &c : cases) EXPECT_FLOAT_EQ(Hz2Mel(c.hz), c.mel);
-    const struct {
-        float mel, hz;
-    } back[] = {{7.5f, 500.00027f}, {15.0f, 1000.0f}, {20.0f, 1410.4342f}, {39.8174f, 5512.0093f}};
-    for (const auto &c : back) EXPECT_FLOAT_EQ(Mel2Hz(c.mel), c.hz);
+    const std::pair<float, float> cases[] = {
+        {0.0f, 0.0f},          {500.0f, 7.499996f},   {999.9f, 14.998492f},  {1000.0f, 15.0f},
+        {2000.0f, 25.077812f}, {5512.0f, 39.817379f}, {11025.0f, 49.896507f}};
+    for (const auto &[hz, mel] : cases) EXPECT_FLOAT_EQ(Hz2Mel(hz), mel);
+    const std::pair<float, float> back[] = {
+        {7.5f, 500.00027f}, {15.0f, 1000.0f}, {20.0f, 1410.4342f}, {39.8174f, 5512.0093f}};
+    for (const auto &[mel, hz] : back) EXPECT_FLOAT_EQ(Mel2Hz(mel), hz);
     // The neighbouring float is what an unrounded logarithm or exponential would give.
     EXPECT_EQ(Hz2Mel(2333.0f), 27.3169632f);
     EXPECT_EQ(Hz2Mel(2703.0f), 29.457243f);

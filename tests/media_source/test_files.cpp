@@ -147,15 +147,13 @@ TEST(ProbeMpeg, TwoHeadersOneFrameLengthApart) {
 // Free format and Layers II and I of MPEG-2.5, whose lengths do not matter in a follower. No
 // bitrate, no rate, no version, no layer, 10 bits of sync, no sync byte.
 TEST(ProbeMpeg, WhatIsNoHeader) {
-    const struct {
-        const char *header;
-        int32_t as_follower;
-    } cases[] = {{"\xFF\xFB\x01", 305},  {"\xFF\xE5\x90", 304},  {"\xFF\xE7\x90", 303},
-                 {"\xFF\xFB\xF0", 2199}, {"\xFF\xFB\x9C", 2199}, {"\xFF\xEB\x90", 2199},
-                 {"\xFF\xF9\x90", 2199}, {"\xFF\xDB\x90", 2199}, {"\xFE\xFB\x90", 2199}};
-    for (const auto &each : cases) {
-        expect_type(2199, {zeros(1) + put(kLayer3Pair, 0, each.header)});
-        expect_type(each.as_follower, {put(kLayer3Pair, 417, each.header)});
+    const std::pair<const char *, int32_t> cases[] = {
+        {"\xFF\xFB\x01", 305},  {"\xFF\xE5\x90", 304},  {"\xFF\xE7\x90", 303},
+        {"\xFF\xFB\xF0", 2199}, {"\xFF\xFB\x9C", 2199}, {"\xFF\xEB\x90", 2199},
+        {"\xFF\xF9\x90", 2199}, {"\xFF\xDB\x90", 2199}, {"\xFE\xFB\x90", 2199}};
+    for (const auto &[header, as_follower] : cases) {
+        expect_type(2199, {zeros(1) + put(kLayer3Pair, 0, header)});
+        expect_type(as_follower, {put(kLayer3Pair, 417, header)});
     }
     // At the lengths that those two layers would have.
     expect_type(2199, {pair("\xFF\xE5\x90", 1044), pair("\xFF\xE7\x90", 624)});
