@@ -1,6 +1,8 @@
 // Opening and closing: through the frame and through each format's own operations.
 #include <fcntl.h>
 
+#include <tuple>
+
 #include "tests/media_source/source_case.h"
 
 namespace {
@@ -49,14 +51,12 @@ TEST_F(OpenClose, EachFailingStepIsCleanedUp) {
 TEST_F(OpenClose, RatesAndChannelsAccepted) {
     for_each_row([&](const source_row &row) {
         const bool any = row.channels != 0;
-        const struct {
-            int32_t rate, channels;
-            bool good;
-        } streams[] = {{row.least - 1, 2, row.least == 0}, {row.least, 1, true}, {44100, 0, any},
-                       {row.most + 1, 2, false},           {row.most, 2, true},  {44100, -1, any}};
-        for (const auto &stream : streams) {
-            EXPECT_EQ(open_row(row, {stream.rate, stream.channels}), stream.good ? 0 : -3)
-                << stream.rate << " Hz, " << stream.channels << " channels";
+        const std::tuple<int32_t, int32_t, bool> streams[] = {
+            {row.least - 1, 2, row.least == 0}, {row.least, 1, true}, {44100, 0, any},
+            {row.most + 1, 2, false},           {row.most, 2, true},  {44100, -1, any}};
+        for (const auto &[rate, channels, good] : streams) {
+            EXPECT_EQ(open_row(row, {rate, channels}), good ? 0 : -3)
+                << rate << " Hz, " << channels << " channels";
         }
     });
     // Floating point, 8 bits, 24 bits, no reader and an empty record.

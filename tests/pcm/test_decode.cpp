@@ -168,7 +168,7 @@ TEST_F(decode_run, seam_is_laid_at_the_last_match) {
         for (int i = 0; i < 2; ++i) ctx.seg[i].count = 2;
         sources[0] = {each.first};
         sources[1] = {noise(16'000, 99) + each.second};
-        ctx.seg[1].buf[16'199] = a[499];  // stale
+        ctx.seg[1].buf[16'199] = static_cast<uint8_t>(a[499]);  // stale
         EXPECT_EQ(pcm(DecodePcmMT(&ctx, ctx.pcm, each.capacity)), each.want);
     }
 }
