@@ -84,7 +84,7 @@ END
 
 make_songs() { # 120 songs of 20 to 45 s in three formats, and a text
   mkdir "$dir/songs"
-  "$bin/make_song" "$dir/song.wav" --seconds 60 --loud-at 20 >/dev/null
+  "$bin/make_song" "$dir/song.wav" --seconds 60 --loud-at 20
   local i
   for i in {0..119}; do
     local format

@@ -19,7 +19,7 @@ def song(**options):
     words = [word for k, v in sorted(options.items()) for word in ("--" + k.replace("_", "-"), str(v))]
     path = pathlib.Path(_songs.name, "".join(words) + ".wav")
     if not path.exists():
-        subprocess.run([MAKE_SONG, path, *words], check=True, stdout=subprocess.DEVNULL)
+        subprocess.run([MAKE_SONG, path, *words], check=True)
     return path
 
 

@@ -6,7 +6,6 @@
 set -eu
 make_song=$1
 out=$2
-mkdir -p "$out"
 exec 9>"$out.lock"
 flock 9 # another build's tests
 here=$(dirname "$0")
@@ -14,29 +13,21 @@ if [ -e "$out/.complete" ] && [ -z "$(find "$0" "$here"/*song*.cpp -newer "$out/
   exit 0
 fi
 rm -rf "$out"
-mkdir -p "$out"
-out=$(cd "$out" && pwd)
+mkdir -p "$out/codec" "$out/formats" "$out/short" "$out/jni"
 
-folder() { # folder NAME: what follows is made there
-  mkdir "$out/$1"
-  cd "$out/$1"
-}
-song() { # song FILE OPTIONS...
-  "$make_song" "$@" >/dev/null
-}
 convert() { # convert IN OUT OPTIONS...: by ffmpeg, without its version in the file
   in=$1 to=$2
   shift 2
   ffmpeg -nostdin -v error -y -i "$in" "$@" -map_metadata -1 -fflags +bitexact -flags:a +bitexact "$to"
 }
 
-folder codec
-song song.wav --seconds 12 --loud-at 4
-song mono.wav --seconds 12 --loud-at 4 --channels 1
-song song48.wav --seconds 12 --loud-at 4 --rate 48000
-song song22.wav --seconds 12 --loud-at 4 --rate 22050
-song song96.wav --seconds 6 --loud-at 2 --rate 96000
-song six.wav --seconds 6 --loud-at 2 --channels 6
+cd "$out/codec"
+"$make_song" song.wav --seconds 12
+"$make_song" mono.wav --seconds 12 --channels 1
+"$make_song" song48.wav --seconds 12 --rate 48000
+"$make_song" song22.wav --seconds 12 --rate 22050
+"$make_song" song96.wav --seconds 6 --rate 96000
+"$make_song" six.wav --seconds 6 --channels 6
 
 # MPEG audio
 lame --quiet -b 128 -t song.wav cbr.mp3
@@ -90,9 +81,9 @@ convert song48.wav opus.ogg -c:a libopus
 
 # One song in each format: the encoders' delays are known. Every fourth hit is far stronger than the
 # others, so that no small change of the signal chooses other beats.
-folder formats
-song hits.wav --drums 0.08 --bed 0.37 --seconds 80 --loud-at 31 --seed 2
-song accents.wav --drums 0.6 --bed 0 --bpm 30 --seconds 80 --loud-at 31 --seed 9
+cd "$out/formats"
+"$make_song" hits.wav --drums 0.08 --bed 0.37 --seconds 80 --loud-at 31 --seed 2
+"$make_song" accents.wav --drums 0.6 --bed 0 --bpm 30 --seconds 80 --loud-at 31 --seed 9
 convert hits.wav song.wav -i accents.wav -filter_complex amix=normalize=0 -c:a pcm_s16le
 rm hits.wav accents.wav
 flac --totally-silent -5 -o song.flac song.wav
@@ -103,18 +94,16 @@ convert song.wav song.aac -c:a aac -b:a 160k
 convert song.aac song.m4a -c:a copy -bsf:a aac_adtstoasc
 oggenc --quiet -q 6 -s 1 -o song.ogg song.wav
 for samples in 576 1024; do # the song as late as the encoders make it
-  convert song.wav late.wav -af "adelay=${samples}S:all=1"
-  flac --totally-silent -5 -o "late_$samples.flac" late.wav
-  rm late.wav
+  convert song.wav "late_$samples.flac" -af "adelay=${samples}S:all=1"
 done
 
 # The brief ones are decoded in one part, the others in four; the long ones have a highlight that is
 # not at their start; the many have more frames than an index first has room for. 11025 Hz goes
 # through the block average, 8000 Hz through the interpolator.
-folder short
+cd "$out/short"
 while read -r name seconds loud_at; do
-  song "$name.wav" --seconds "$seconds" --loud-at "$loud_at" --channels 1 --rate 11025
-  song low.wav --seconds "$seconds" --loud-at "$loud_at" --channels 1 --rate 8000
+  "$make_song" "$name.wav" --seconds "$seconds" --loud-at "$loud_at" --channels 1 --rate 11025
+  "$make_song" low.wav --seconds "$seconds" --loud-at "$loud_at" --channels 1 --rate 8000
   lame --quiet -b 24 -m m --add-id3v2 --tt 'A Title' --ta 'An Artist' --tc 'A comment' "$name.wav" "$name.mp3"
   flac --totally-silent -5 -b 1024 -T 'TITLE=A Title' -T 'KEY=Am' -o "$name.flac" low.wav
   convert low.wav "$name.aac" -c:a aac -b:a 24k
@@ -130,8 +119,8 @@ long 15 8
 many 150 40
 END
 
-folder jni
-song song.wav --seconds 20 --bpm 120 --loud-at 6
-song clip.wav --seconds 2
+cd "$out/jni"
+"$make_song" song.wav --seconds 20 --loud-at 6
+"$make_song" clip.wav --seconds 2
 
 touch "$out/.complete"
