@@ -3,11 +3,11 @@
 #define TAVO_TESTS_CORE_CORE_SONG_H
 
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <initializer_list>
 #include <string>
 
+#include "tests/support/bytes.h"
 #include "tests/support/job_harness.h"
 #include "tests/support/song.h"
 
@@ -17,15 +17,12 @@ constexpr std::initializer_list<int32_t> kModes = {TAVO_MODE_HIGHLIGHT, TAVO_MOD
                                                    TAVO_MODE_BOTH};
 
 // A WAV file for as long as the program runs.
-struct file {
-    explicit file(support::song of) : song(std::move(of)) {
+struct file : support::temporary_file {
+    explicit file(const support::song &of)
+        : temporary_file("core_" + std::to_string(of.pcm.size()) + ".wav"), song(of) {
         EXPECT_TRUE(support::write_wav(path, song));
     }
-    ~file() { unlink(path.c_str()); }
-
     const support::song song;
-    const std::string path = testing::TempDir() + "tavo_core_" + std::to_string(getpid()) + "_" +
-                             std::to_string(song.pcm.size()) + ".wav";
 };
 
 inline const file &whole() {

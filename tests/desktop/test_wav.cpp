@@ -15,11 +15,6 @@ samples numbers(size_t count) {
     return pcm;
 }
 
-std::string wav(const samples &pcm, int32_t rate, int32_t channels) {
-    const auto file = support::wav_bytes(pcm, rate, channels);
-    return {file.begin(), file.end()};
-}
-
 // The file with another number of so many bytes at an offset.
 std::string patched(std::string file, size_t at, uint64_t value, size_t size = 2) {
     return file.replace(at, size, reinterpret_cast<const char *>(&value), size);  // little-endian
@@ -27,7 +22,7 @@ std::string patched(std::string file, size_t at, uint64_t value, size_t size = 2
 
 TEST(Wav, ReadsEveryShapeOfHeader) {
     const samples pcm = numbers(60000);
-    const std::string file = wav(pcm, 44100, 2), data = file.substr(kData);
+    const std::string file = support::wav_bytes(pcm, 44100, 2), data = file.substr(kData);
     const auto with_size = [&](uint64_t bytes) { return patched(file, kData + 4, bytes, 4); };
     // 22 bytes more: 16 bits in use, no speakers, PCM.
     const std::string extension = "\26\0\20\0\0\0\0\0\1\0\0\0\0\0\20\0\x80\0\0\xAA\0\x38\x9B\x71"s;
@@ -41,8 +36,8 @@ TEST(Wav, ReadsEveryShapeOfHeader) {
         size_t channels, frames;
     } shapes[] = {
         {"plain", file, 2, 30000},
-        {"mono", wav(pcm, 44100, 1), 1, 60000},
-        {"six", wav(pcm, 44100, 6), 6, 10000},
+        {"mono", support::wav_bytes(pcm, 44100, 1), 1, 60000},
+        {"six", support::wav_bytes(pcm, 44100, 6), 6, 10000},
         {"extensible", format + extension + data, 2, 30000},
         {"odd", plain + odd + data + odd, 2, 30000},
         {"format last",
@@ -68,7 +63,7 @@ TEST(Wav, ReadsEveryShapeOfHeader) {
 
 // Where the header says anything, an unusable format is told from unusable data.
 TEST(Wav, RefusesWhatTheSourceCannotUse) {
-    const std::string file = wav(numbers(2000), 44100, 2);
+    const std::string file = support::wav_bytes(numbers(2000), 44100, 2);
     const auto coded = [&](uint64_t tag, uint64_t bits) {
         return patched(patched(file, kFormat + 8, tag), kFormat + 22, bits);
     };
@@ -93,7 +88,7 @@ TEST(Wav, RefusesWhatTheSourceCannotUse) {
 
 TEST(Wav, SeeksToWholeSeconds) {
     const samples pcm = numbers(22051);  // one sample beyond 2 s
-    const opened file(save("seek.wav", wav(pcm, 11025, 1)));
+    const opened file(save("seek.wav", support::wav_bytes(pcm, 11025, 1)));
     ASSERT_NE(file.source, nullptr);
     const std::pair<int64_t, int64_t> landings[] = {{19'999'999, 11025}, {0, 0},
                                                     {20'000'000, 22050}, {30'000'000, 22051},

@@ -14,16 +14,14 @@ constexpr int64_t kRate = 48'000;
 // Its last second has samples of 1000. The sizes in the header saturate.
 std::string sparse_wav(int32_t channels, int64_t seconds) {
     const auto second = static_cast<size_t>(kRate * channels);
-    std::vector<uint8_t> file =
-        support::wav_bytes(std::vector<int16_t>(second, 1000), kRate, channels);
-    constexpr ptrdiff_t kHead = 44;
+    std::string file = support::wav_bytes(std::vector<int16_t>(second, 1000), kRate, channels);
+    constexpr size_t kHead = 44;
     const int64_t data = seconds * 2 * static_cast<int64_t>(second);
     const auto shown = static_cast<uint32_t>(std::min<int64_t>(data, UINT32_MAX));
     memcpy(&file[40], &shown, sizeof shown);
-    const std::string path = codec_test::save("sparse.wav", {file.begin(), file.begin() + kHead});
-    const int64_t size = 2 * static_cast<int64_t>(second);
+    const std::string path = codec_test::save("sparse.wav", file.substr(0, kHead));
     std::fstream out(path, std::ios::in | std::ios::out | std::ios::binary);
-    out.seekp(kHead + data - size).write(reinterpret_cast<char *>(&file[kHead]), size);
+    out.seekp(static_cast<int64_t>(2 * kHead - file.size()) + data) << file.substr(kHead);
     EXPECT_TRUE(out.flush().good());
     return path;
 }

@@ -2,8 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
-#include <cstdio>
-#include <cstring>
+#include <fstream>
 
 namespace support {
 namespace {
@@ -128,12 +127,12 @@ song make_song(const song_spec &plan) {
     return made;
 }
 
-std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t channels) {
-    std::vector<uint8_t> out;
+std::string wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t channels) {
+    std::string out;
     const auto put = [&out](const char *name, std::initializer_list<size_t> numbers) {
-        out.insert(out.end(), name, name + strlen(name));
+        out += name;
         for (const size_t number : numbers) {  // 32 bits, little-endian
-            for (int i = 0; i < 4; ++i) out.push_back(static_cast<uint8_t>(number >> 8 * i));
+            for (int i = 0; i < 4; ++i) out += static_cast<char>(number >> 8 * i);
         }
     };
     const size_t bytes = 2 * pcm.size();
@@ -141,19 +140,13 @@ std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, in
     put("RIFF", {bytes + 36});
     put("WAVEfmt ", {16, 1 | count << 16, hz, hz * 2 * count, 2 * count | 16 << 16});
     put("data", {bytes});
-    for (const int16_t sample : pcm) {
-        out.push_back(static_cast<uint8_t>(sample));
-        out.push_back(static_cast<uint8_t>(sample >> 8));
-    }
-    return out;
+    return out.append(reinterpret_cast<const char *>(pcm.data()), bytes);
 }
 
 bool write_wav(const std::string &path, const song &what) {
-    const std::vector<uint8_t> content = wav_bytes(what.pcm, what.plan.rate, what.plan.channels);
-    FILE *file = fopen(path.c_str(), "wb");
-    if (file == nullptr) return false;
-    const bool whole = fwrite(content.data(), 1, content.size(), file) == content.size();
-    return fclose(file) == 0 && whole;
+    std::ofstream file(path, std::ios::binary);
+    file << wav_bytes(what.pcm, what.plan.rate, what.plan.channels) << std::flush;
+    return file.good();
 }
 
 }  // namespace support

@@ -32,7 +32,7 @@ struct song {
 song make_song(const song_spec &plan);
 
 // A whole file of interleaved 16-bit samples, its header the canonical 44 bytes.
-std::vector<uint8_t> wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t channels);
+std::string wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t channels);
 
 // False, with errno set, when the file cannot be written whole.
 bool write_wav(const std::string &path, const song &what);
