@@ -18,6 +18,11 @@ void decode_segment(void *record) {
     seg->got = read_pcm(seg->src, seg->buf, seg->cap);
 }
 
+// Whether there is a plan that this stage can have made.
+bool is_planned(const TAVO_CTX *ctx) {
+    return ctx->seg != nullptr && ctx->seg_count >= 1 && ctx->seg_count <= kMaxSegments;
+}
+
 // Bytes of pcm that hold the segment's buffer, at least one cache line.
 int64_t part_bytes(const TAVO_DECSEG *seg) {
     return (seg->cap / kCacheLine + 1) * kCacheLine;
@@ -60,10 +65,8 @@ void *_tavo_mtproc_decoding(void *seg) {
 }
 
 int64_t DecodePcmMT(TAVO_CTX *ctx, void *dst, int64_t dst_capacity) {
+    if (!is_planned(ctx) || ext_mutex_mt == nullptr) return 0;
     const int32_t count = ctx->seg_count;
-    if (ctx->seg == nullptr || ext_mutex_mt == nullptr) return 0;
-    if (count < 1 || count > kMaxSegments) return 0;
-
     worker_slot slots[kMaxSegments] = {};
     for (int32_t i = 0; i < count; ++i) {
         TAVO_DECSEG *seg = &ctx->seg[i];
@@ -77,7 +80,7 @@ int64_t DecodePcmMT(TAVO_CTX *ctx, void *dst, int64_t dst_capacity) {
 void decode_song(TAVO_CTX *ctx) {
     const int64_t capacity = ctx->pcm_bytes;
     ctx->pcm_bytes = 0;
-    if (ctx->seg == nullptr || !share_pcm(ctx)) return;
+    if (!is_planned(ctx) || !share_pcm(ctx)) return;
     ctx->pcm_bytes = DecodePcmMT(ctx, ctx->pcm, capacity);
     for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].buf = nullptr;
 }

@@ -117,6 +117,9 @@ TEST_F(decode_run, seams_vanish) {
     EXPECT_EQ(DecodePcmMT(&ctx, nullptr, 160'000), 0);
     TAVO_CTX bare = {};
     EXPECT_EQ(DecodePcmMT(&bare, ctx.pcm, 160'000), 0);
+    ctx.seg_count = 0;
+    decode_song(&ctx);  // the PCM stays to be released
+    EXPECT_TRUE(ctx.pcm_bytes == 0 && ctx.seg[3].buf != nullptr);
 }
 
 TEST_F(decode_run, failure_codes_and_empty_replies) {
