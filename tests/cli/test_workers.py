@@ -94,8 +94,13 @@ class Workers(Case):
                 (os.kill, signal.SIGINT, "--plot p.svg long.wav", "long.wav", [])):
             with self.subTest(words=words, send=send):
                 process = self.start(*words.split())
-                worker = self.worker_with(process, busy)
+                worker = first = self.worker_with(process, "long.wav")
+                if busy != "long.wav":  # that one is not finished before
+                    os.kill(first, signal.SIGSTOP)
+                    worker = self.worker_with(process, busy)
                 send(process.pid, number)
+                if worker != first:
+                    os.kill(first, signal.SIGCONT)
                 out, err = process.communicate(timeout=120)
                 self.assertFalse(os.path.exists(f"/proc/{worker}"))
                 self.assertEqual(process.returncode, 128 + number, err)
