@@ -1,5 +1,5 @@
 // Diagnostic: the analysed signal with a blip at every beat, as a mono 16-bit WAV file.
-// The path is the public global fnamedec (core/tavo.h). Before: beat/beats.h.
+// The path is the public global fnamedec (include/tavo.h). Before: beat/beats.h.
 #ifndef TAVO_BEAT_CLICK_TRACK_H
 #define TAVO_BEAT_CLICK_TRACK_H
 

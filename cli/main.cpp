@@ -5,10 +5,10 @@
 #include <cstdio>
 #include <exception>
 
-#include "cli/forecast.h"
 #include "cli/options.h"
-#include "cli/stop.h"
-#include "cli/workers.h"
+#include "cli/run/forecast.h"
+#include "cli/run/stop.h"
+#include "cli/run/workers.h"
 
 namespace {
 

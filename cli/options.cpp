@@ -9,10 +9,10 @@
 #include <iostream>
 #include <sstream>
 
-#include "cli/frame_rate.h"
-#include "cli/markers.h"
-#include "cli/words.h"
-#include "core/tavo.h"
+#include "cli/write/frame_rate.h"
+#include "cli/write/markers.h"
+#include "cli/write/words.h"
+#include "include/tavo.h"
 
 namespace {
 

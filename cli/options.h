@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "cli/shard.h"
+#include "cli/input/shard.h"
 
 enum class result_format {
     none,  // nothing: the store has the results

@@ -11,7 +11,7 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "core/tavo.h"
+#include "include/tavo.h"
 
 struct TAVO_DECSEG;  // pcm/decode.h
 

@@ -1,6 +1,6 @@
 // The instance's life between creation and release: its two locks, the start of its job, the stop.
 //
-// In: the calls of core/tavo.h. Out: a job of core/jobs.h on a thread of its own.
+// In: the calls of include/tavo.h. Out: a job of core/jobs.h on a thread of its own.
 // Before: core/instance.h, core/jobs.h. After: the host.
 #ifndef TAVO_CORE_LIFECYCLE_H
 #define TAVO_CORE_LIFECYCLE_H

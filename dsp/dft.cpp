@@ -2,8 +2,8 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "core/tavo.h"
 #include "dsp/fft.h"
+#include "include/tavo.h"
 
 namespace {
 

@@ -1,15 +1,15 @@
 // Stage 8: the Java bridge.
 //
 // In: the native methods of com.kestu.tavo.Tavo, for one instance in a process. Out: one call of
-// the class's static postEventFromNative per job, on the job's worker thread. Before: core/tavo.h.
-// After: java/com/kestu/tavo/Tavo.java.
+// the class's static postEventFromNative per job, on the job's worker thread. Before:
+// include/tavo.h. After: java/com/kestu/tavo/Tavo.java.
 #ifndef TAVO_JNI_TAVO_JNI_H
 #define TAVO_JNI_TAVO_JNI_H
 
 #include <jni.h>
 #include <pthread.h>
 
-#include "core/tavo.h"
+#include "include/tavo.h"
 
 extern "C" {
 
@@ -42,7 +42,7 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *env, jobject thi
 // is changed).
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *env, jobject thiz);
 
-// Static: sets fnamedec (core/tavo.h) to an empty path, so that no click track is written.
+// Static: sets fnamedec (include/tavo.h) to an empty path, so that no click track is written.
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *env, jclass host);
 
 // The callback of the bridge's instances. Posts exactly one event: (object, 1, hl_pos, beat_count,

@@ -6,7 +6,7 @@
 
 #include <pthread.h>
 
-#include "core/tavo.h"
+#include "include/tavo.h"
 #include "media_source/mtsrc.h"
 
 constexpr int32_t kQueueBytes = 1'048'576;  // of q_cap

@@ -1,7 +1,7 @@
 #include <cstring>
 
 #include "common/limits.h"
-#include "core/tavo.h"
+#include "include/tavo.h"
 #include "media_source/id3v2.h"
 #include "media_source/mtsrc.h"
 

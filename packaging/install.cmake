@@ -2,7 +2,7 @@
 # folder: <tavo.h>, <media_source/mtsrc.h>. Whatever is installed finds the rest relative to itself.
 set(headers_dir ${CMAKE_INSTALL_INCLUDEDIR}/tavo)
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/tavo)
-install(FILES core/tavo.h DESTINATION ${headers_dir})
+install(FILES include/tavo.h DESTINATION ${headers_dir})
 install(FILES media_source/mtsrc.h media_source/mtsrc_io.h DESTINATION ${headers_dir}/media_source)
 install(TARGETS tavo EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}
   INCLUDES DESTINATION ${headers_dir})

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "core/tavo.h"
+#include "include/tavo.h"
 
 namespace {
 

@@ -16,7 +16,7 @@ foreach(page song index)
   file(READ ${CMAKE_CURRENT_BINARY_DIR}/${page}.html ${page}_page)
 endforeach()
 file(CONFIGURE OUTPUT ${report_pages} @ONLY CONTENT [[
-#include "cli/report_pages.h"
+#include "cli/report/report_pages.h"
 
 const char kSongPage[] = R"page(@song_page@)page";
 const char kIndexPage[] = R"page(@index_page@)page";

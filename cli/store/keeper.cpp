@@ -4,10 +4,10 @@
 
 #include <algorithm>
 
-#include "cli/names.h"
-#include "cli/stop.h"
-#include "cli/words.h"
-#include "cli/worker.h"
+#include "cli/run/names.h"
+#include "cli/run/stop.h"
+#include "cli/run/worker.h"
+#include "cli/write/words.h"
 
 namespace {
 

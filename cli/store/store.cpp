@@ -9,8 +9,8 @@
 #include <cerrno>
 #include <ctime>
 
-#include "cli/names.h"
-#include "cli/words.h"
+#include "cli/run/names.h"
+#include "cli/write/words.h"
 
 namespace {
 

@@ -1,0 +1,206 @@
+#include "cli/input/inputs.h"
+
+#include <dirent.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <functional>
+
+#include "cli/input/recognise.h"
+#include "cli/run/names.h"
+#include "cli/write/markers.h"
+#include "cli/write/words.h"
+#include "media_source/mtsrc.h"
+
+namespace {
+
+std::string joined(const std::string &folder, const std::string &name) {
+    return folder.back() == '/' ? folder + name : folder + "/" + name;
+}
+
+void add_note(input_supply &supply, const std::string &sentence) {
+    supply.notes += "tavo: " + sentence + "\n";
+}
+
+uint64_t hash_of(uint64_t device, uint64_t inode, const std::string &name) {
+    return std::hash<std::string>()(std::to_string(device) + "/" + std::to_string(inode) + "/" +
+                                    name);
+}
+
+// Claims the marker file of an input, so that no other input writes the same one. False leaves the
+// input out.
+bool claim_target(input_supply &supply, input &entry) {
+    const std::string target = marker_path(entry.path, supply.opts);
+    const std::string name = base_name(target);
+    struct stat info {};
+    if (supply.opts.skip_existing && lstat(target.c_str(), &info) == 0) {
+        ++supply.existing;
+        return false;
+    }
+    if (stat((target.substr(0, target.size() - name.size()) + ".").c_str(), &info) != 0) {
+        return true;  // writing will tell
+    }
+    const uint64_t target_hash = hash_of(info.st_dev, info.st_ino, name);
+    if (stat(entry.path.c_str(), &info) != 0) return true;
+    const uint64_t input_hash = hash_of(info.st_dev, info.st_ino, "");
+    const auto [claim, first] = supply.targets.emplace(target_hash, input_hash);
+    if (first) return true;
+    if (claim->second == input_hash) {
+        add_note(supply, shown(entry.path) + ": named more than once, done once.");
+        return false;
+    }
+    entry.error = "Its file " + shown(target) +
+                  " would replace that of another input, whose name is the same.";
+    return true;
+}
+
+// The entries' names in the order of their bytes. Returns 0 or errno.
+int list_folder(open_folder &folder) {
+    DIR *stream = opendir(folder.path.c_str());
+    if (stream == nullptr) return errno;
+    errno = 0;
+    while (const dirent *entry = readdir(stream)) {
+        const std::string name = entry->d_name;
+        if (name != "." && name != "..") folder.names.push_back(name);
+    }
+    const int code = errno;
+    closedir(stream);
+    std::sort(folder.names.begin(), folder.names.end());
+    return code;
+}
+
+// Begins to search a folder, unless a link has led back to one that is being searched.
+// True when there is an input to hand out instead.
+bool enter_folder(input_supply &supply, const std::string &path, const struct stat &info,
+                  input &out) {
+    open_folder folder;
+    folder.path = path;
+    folder.id[0] = info.st_dev;
+    folder.id[1] = info.st_ino;
+    for (const open_folder &outer : supply.folders) {
+        if (std::equal(outer.id, outer.id + 2, folder.id)) return false;
+    }
+    const int code = list_folder(folder);
+    if (code != 0) {
+        out = {path, system_sentence("The folder cannot be read", code)};
+        ++supply.found;
+        return true;
+    }
+    if (supply.folders.empty()) supply.found = supply.skipped = 0;
+    supply.folders.push_back(std::move(folder));
+    return false;
+}
+
+// The innermost folder holds no more. True for an input that says that there was no audio.
+bool leave_folder(input_supply &supply, input &out) {
+    const std::string path = supply.folders.back().path;
+    supply.folders.pop_back();
+    if (!supply.folders.empty()) return false;
+    if (supply.found == 0) {
+        out = {path, "The folder holds no audio files" +
+                         std::string(supply.opts.recursive
+                                         ? "."
+                                         : " itself; --recursive searches the folders in it.")};
+        return true;
+    }
+    if (supply.skipped > 0) {
+        add_note(supply, shown(path) + ": " + count_text(supply.skipped, "file") +
+                             " left out, not recognised as audio.");
+    }
+    return false;
+}
+
+bool take_entry(input_supply &supply, input &out) {
+    open_folder &folder = supply.folders.back();
+    if (folder.next == folder.names.size()) return leave_folder(supply, out);
+    const std::string path = joined(folder.path, folder.names[folder.next++]);
+    struct stat info {};
+    if (stat(path.c_str(), &info) != 0) return false;
+    if (S_ISDIR(info.st_mode)) {
+        return supply.opts.recursive && enter_folder(supply, path, info, out);
+    }
+    if (!S_ISREG(info.st_mode)) return false;
+    int32_t type = kMtsrcTypeUnknown;
+    const int code = recognise(path, type);
+    const bool unreadable = code == EACCES || code == EPERM || code == EIO;
+    const bool audio = code == 0 && type != kMtsrcTypeUnknown;
+    if (!unreadable && !audio) {
+        ++supply.skipped;
+        return false;
+    }
+    ++supply.found;
+    out = {path, unreadable ? system_sentence("The file cannot be read", code) : ""};
+    return true;
+}
+
+bool take_path(input_supply &supply, const std::string &path, input &out) {
+    struct stat info {};
+    if (stat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) {
+        return enter_folder(supply, path, info, out);
+    }
+    out = {path, ""};
+    return true;
+}
+
+// True for an input; waiting is set when the list has no more for now.
+bool take_from_list(input_supply &supply, input &out, bool &waiting) {
+    std::string name;
+    std::string error;
+    const list_state state = next_name(supply.list, supply.opts.list_separator, name, error);
+    if (state == list_state::name) return take_path(supply, name, out);
+    waiting = state == list_state::waiting;
+    if (waiting) return false;
+    close_list(supply.list);
+    if (state == list_state::ended && supply.list.names == 0) {
+        add_note(supply, list_text(supply.list) + " names no files.");
+    }
+    out = {supply.list.name, error};
+    return state == list_state::failed;
+}
+
+bool take_argument(input_supply &supply, input &out) {
+    const options &opts = supply.opts;
+    const size_t index = supply.argument++;
+    const bool listed = index >= opts.inputs.size();
+    const std::string &word = listed ? opts.lists[index - opts.inputs.size()] : opts.inputs[index];
+    if (!listed && word != "-") return take_path(supply, word, out);
+    const int code = open_list(supply.list, word);
+    if (code == 0) return false;
+    out = {word, system_sentence("The list of files cannot be read", code)};
+    return true;
+}
+
+// True for an input.
+bool take_next(input_supply &supply, input &out, bool &waiting) {
+    if (!supply.folders.empty()) return take_entry(supply, out);
+    if (supply.list.fd >= 0) return take_from_list(supply, out, waiting);
+    return take_argument(supply, out);
+}
+
+bool is_done(const input_supply &supply) {
+    return supply.folders.empty() && supply.list.fd < 0 &&
+           supply.argument == supply.opts.inputs.size() + supply.opts.lists.size();
+}
+
+}  // namespace
+
+supply_state next_input(input_supply &supply, input &out) {
+    bool waiting = false;
+    while (!is_done(supply) && !waiting) {
+        if (!take_next(supply, out, waiting)) continue;
+        if (!out.error.empty() || !writes_files(supply.opts.format) || claim_target(supply, out)) {
+            return supply_state::ready;
+        }
+    }
+    if (waiting) return supply_state::waiting;
+    if (supply.existing > 0) {
+        add_note(supply, count_text(supply.existing, "input") + " left out: the file is there.");
+        supply.existing = 0;
+    }
+    return supply_state::ended;
+}
+
+int supply_fd(const input_supply &supply) {
+    return supply.list.fd;
+}

@@ -1,0 +1,19 @@
+#include "cli/input/library_path.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include "common/limits.h"
+
+library_path open_library_path(const std::string &path) {
+    if (path == "fd") return {"./fd", -1};  // "fd" alone means a descriptor
+    if (path.size() < kPathBytes) return {path, -1};
+    const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
+    if (fd < 0) return {path, -1};
+    return {"/proc/self/fd/" + std::to_string(fd), fd};
+}
+
+void close_library_path(library_path &opened) {
+    if (opened.fd >= 0) close(opened.fd);
+    opened.fd = -1;
+}

@@ -1,0 +1,113 @@
+#include "cli/input/list_reader.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <climits>
+
+#include "cli/input/recognise.h"
+#include "cli/run/names.h"
+#include "cli/write/words.h"
+#include "common/limits.h"
+#include "media_source/mtsrc.h"
+
+namespace {
+
+constexpr size_t kReadBytes = 65'536;
+constexpr size_t kMostNameBytes = PATH_MAX;  // the system opens nothing longer
+constexpr const char *kByteOrderMark = "\xEF\xBB\xBF";
+
+bool is_readable(int fd) {
+    pollfd watched = {fd, POLLIN, 0};
+    return poll(&watched, 1, 0) > 0;
+}
+
+// Returns 0 or errno.
+int read_more(list_reader &list) {
+    std::array<char, kReadBytes> part{};
+    const ssize_t got = read(list.fd, part.data(), part.size());
+    if (got < 0) return errno == EINTR || errno == EAGAIN ? 0 : errno;
+    list.ended = got == 0;
+    list.text.append(part.data(), static_cast<size_t>(got));
+    return 0;
+}
+
+// A song given in the place of a list would make thousands of names.
+std::string explain_no_list(const list_reader &list, char separator) {
+    int32_t type = kMtsrcTypeUnknown;
+    if (list.text.size() >= static_cast<size_t>(kHeadBytes)) recognise_bytes(list.text, type);
+    if (type != kMtsrcTypeUnknown) {
+        const std::string subject = list.name == "-" ? "Standard input" : "The list";
+        return subject + " holds sound (" + type_name(type) + "), not a list of names; " +
+               (list.name == "-" ? "save it to a file first." : "name it as FILE.");
+    }
+    if (separator != '\0' && list.text.find('\0') != std::string::npos) {
+        return "The list holds NUL bytes: give -0 when its names end with them.";
+    }
+    return "";
+}
+
+bool is_comment(const std::string &line) {
+    struct stat info {};
+    return line[0] == '#' && lstat(line.c_str(), &info) != 0;
+}
+
+// Takes what comes before the separator. False when the separator is not there yet.
+bool take_line(list_reader &list, char separator, std::string &line) {
+    const size_t end = list.text.find(separator);
+    if (end == std::string::npos && (!list.ended || list.text.empty())) return false;
+    line = list.text.substr(0, end);
+    list.text.erase(0, end == std::string::npos ? end : end + 1);
+    if (separator == '\n' && !line.empty() && line.back() == '\r') line.pop_back();
+    return true;
+}
+
+}  // namespace
+
+int open_list(list_reader &list, const std::string &name) {
+    list = list_reader{};
+    list.name = name;
+    list.fd = name == "-" ? STDIN_FILENO : open(name.c_str(), O_RDONLY | O_CLOEXEC);
+    return list.fd < 0 ? errno : 0;
+}
+
+list_state next_name(list_reader &list, char separator, std::string &name, std::string &error) {
+    while (true) {
+        if (!list.begun && !list.text.empty()) {
+            list.begun = true;
+            error = explain_no_list(list, separator);
+            if (!error.empty()) return list_state::failed;
+            if (list.text.compare(0, 3, kByteOrderMark) == 0) list.text.erase(0, 3);
+        }
+        while (take_line(list, separator, name)) {
+            if (name.empty() || (separator == '\n' && is_comment(name))) continue;
+            ++list.names;
+            return list_state::name;
+        }
+        if (list.text.size() > kMostNameBytes) {
+            error = "The list holds a name of more than " + std::to_string(kMostNameBytes) +
+                    " bytes; is it a list of names?";
+            return list_state::failed;
+        }
+        if (list.ended) return list_state::ended;
+        if (!is_readable(list.fd)) return list_state::waiting;
+        const int code = read_more(list);
+        if (code != 0) {
+            error = system_sentence("The list of files cannot be read", code);
+            return list_state::failed;
+        }
+    }
+}
+
+void close_list(list_reader &list) {
+    if (list.fd > STDIN_FILENO) close(list.fd);
+    list.fd = -1;
+}
+
+std::string list_text(const list_reader &list) {
+    return list.name == "-" ? "the list on standard input" : "the list " + shown(list.name);
+}

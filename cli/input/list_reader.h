@@ -1,0 +1,31 @@
+// A list of names, read as it comes: from a file, a pipe or a terminal.
+#ifndef TAVO_CLI_INPUT_LIST_READER_H
+#define TAVO_CLI_INPUT_LIST_READER_H
+
+#include <string>
+
+struct list_reader {
+    std::string name;  // of the list, "-" for standard input
+    int fd = -1;       // -1 when no list is being read
+    std::string text;  // read and not yet taken
+    bool begun = false;
+    bool ended = false;  // nothing more can be read
+    size_t names = 0;    // taken
+};
+
+enum class list_state { name, waiting, ended, failed };
+
+// Returns 0 or errno.
+int open_list(list_reader &list, const std::string &name);
+
+// Takes the next name: one that ends with the separator, or what stands before the list's end.
+// Lists with a newline per name may be M3U playlists: carriage returns at line ends and comments
+// are dropped. failed: error says why. Never waits.
+list_state next_name(list_reader &list, char separator, std::string &name, std::string &error);
+
+void close_list(list_reader &list);
+
+// "the list on standard input" or "the list NAME".
+std::string list_text(const list_reader &list);
+
+#endif

@@ -1,0 +1,139 @@
+#include "cli/run/analyse.h"
+
+#include <poll.h>
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+
+#include "cli/input/explain.h"
+#include "cli/input/library_path.h"
+#include "cli/write/click.h"
+#include "cli/write/markers.h"
+#include "cli/write/words.h"
+#include "include/tavo.h"
+
+namespace {
+
+// Written by the callback on the job's thread, which gets no argument of ours: the pointer hands
+// over the result, the pipe wakes the waiting thread.
+std::atomic<const TAVO_INFO *> result{nullptr};
+int done_write_fd = -1;
+
+void on_result(TAVO_INFO *info) {
+    result.store(info, std::memory_order_release);
+    const char done = 1;
+    while (write(done_write_fd, &done, 1) < 0 && errno == EINTR) {
+    }
+}
+
+// Waits for the callback or the stop. Returns false for the stop.
+bool wait_for_result(int done_fd, int stop_fd) {
+    pollfd watched[2] = {{done_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
+    while (true) {
+        if (poll(watched, 2, -1) < 0) continue;  // EINTR
+        if (watched[0].revents != 0) return result.load(std::memory_order_acquire) != nullptr;
+        if (watched[1].revents != 0) return false;
+    }
+}
+
+void take_stream(const TAVO_CTX *ctx, record &out) {
+    tavo_get_stream(ctx, &out.sample_rate, &out.channels, &out.duration_ms);
+    out.has_stream = true;
+}
+
+// After the callback the job writes nothing any more.
+void take_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
+    if (tavo_has_audio(ctx) == 0) {
+        out.error = "No audio could be decoded from the file.";
+        return;
+    }
+    out.has_highlight = out.mode != TAVO_MODE_BEATS;
+    out.hl_pos_ms = info->hl_pos;
+    if (info->status != 0) {
+        out.error = out.mode == TAVO_MODE_BOTH
+                        ? "No beats were found after the highlight."
+                        : "No beats were found: the file may be silent or too short for a rhythm.";
+        return;
+    }
+    out.status = outcome::ok;
+    if (out.mode == TAVO_MODE_HIGHLIGHT) return;
+    out.has_beats = true;
+    out.bpm = tavo_get_tempo(ctx);
+    out.beats_ms.assign(info->beat_times, info->beat_times + info->beat_count);
+}
+
+// Runs the job of an instance and releases it.
+void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
+    take_stream(ctx, out);
+    int done_pipe[2];
+    if (pipe(done_pipe) != 0) {
+        out.error = system_sentence("The analysis could not be started", errno);
+        tavo_deinit(ctx);
+        return;
+    }
+    done_write_fd = done_pipe[1];
+    result.store(nullptr);
+    tavo_setcallback(ctx, on_result);
+    const int32_t code = tavo_analyze(ctx, opts.length_s, opts.max_beats, 0);
+    if (code != TAVO_OK) {
+        out.error = "The analysis could not be started (code " + std::to_string(code) + ").";
+    } else if (wait_for_result(done_pipe[0], stop_fd)) {
+        take_result(ctx, result.load(), out);
+    } else {
+        out.status = outcome::stopped;
+        out.error = "The analysis was stopped.";
+    }
+    tavo_deinit(ctx);
+    close(done_pipe[0]);
+    close(done_pipe[1]);
+}
+
+void analyse_opened(const library_path &opened, const options &opts, int stop_fd, record &out) {
+    const TAVO_PARAM param = {opened.path.c_str(), opts.mode};
+    int32_t code = TAVO_OK;
+    TAVO_CTX *ctx = tavo_init(&param, &code);
+    if (ctx == nullptr) {
+        out.error = explain_unusable(opened.path, code, out);
+        return;
+    }
+    run_job(ctx, opts, stop_fd, out);
+}
+
+// Of this process, all threads: user and system.
+int64_t cpu_time_ms() {
+    rusage used{};
+    getrusage(RUSAGE_SELF, &used);
+    const auto ms = [](const timeval &time) { return 1000 * time.tv_sec + time.tv_usec / 1000; };
+    return ms(used.ru_utime) + ms(used.ru_stime);
+}
+
+}  // namespace
+
+record analyse(const std::string &path, const options &opts, int stop_fd) {
+    record out = failed_record(path, opts.mode, explain_before_open(path));
+    out.length_s = opts.length_s;
+    if (!out.error.empty()) return out;
+
+    click_file click;
+    out.error = begin_click(click, opts.click, path, opts.force);
+    if (!out.error.empty()) return out;
+
+    library_path opened = open_library_path(path);
+    const int64_t before_ms = cpu_time_ms();
+    analyse_opened(opened, opts, stop_fd, out);
+    out.cpu_ms = cpu_time_ms() - before_ms;
+    close_library_path(opened);
+    std::string cue;
+    if (opts.format == result_format::cue) {
+        cue = cue_chunks(out);
+        out.written = opts.click;
+    }
+    const std::string error = finish_click(click, out.status == outcome::ok, cue);
+    if (!error.empty()) {
+        out.status = outcome::failed;
+        out.error = error;
+    }
+    return out;
+}

@@ -1,0 +1,27 @@
+#include "cli/run/record.h"
+
+#include <algorithm>
+
+#include "highlight/power_envelope.h"
+
+record failed_record(const std::string &file, int32_t mode, const std::string &error) {
+    record result;
+    result.file = file;
+    result.mode = mode;
+    result.error = error;
+    return result;
+}
+
+double highlight_end_ms(const record &result, int32_t length_s) {
+    const double start = result.hl_pos_ms;
+    const double end = std::min(start + 1000.0 * length_s, static_cast<double>(result.duration_ms));
+    return std::max(start, end);
+}
+
+bool has_refinement(const record &result) {
+    return result.has_highlight && result.mode == TAVO_MODE_HIGHLIGHT;
+}
+
+bool is_refined(const record &result) {
+    return result.hl_pos_ms % (1000 * kPowerHopSeconds) != 0;
+}

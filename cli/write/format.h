@@ -1,0 +1,25 @@
+// A record as text for standard output, in one of the formats.
+#ifndef TAVO_CLI_WRITE_FORMAT_H
+#define TAVO_CLI_WRITE_FORMAT_H
+
+#include <string>
+
+#include "cli/options.h"
+#include "cli/run/record.h"
+
+// What comes before the first record; empty for most formats.
+std::string format_head(result_format format);
+
+// One record; empty when the format has nothing to say about it on standard output.
+std::string format_record(result_format format, const record &result);
+
+std::string text_record(const record &result);
+std::string json_record(const record &result);
+
+// The record that json_record made the text of, but for the file's name. Throws std::exception for
+// any other text.
+record record_from_json(const std::string &text);
+std::string csv_head();
+std::string csv_record(const record &result);
+
+#endif

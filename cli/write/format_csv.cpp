@@ -1,0 +1,52 @@
+#include <cmath>
+
+#include "cli/write/format.h"
+#include "cli/write/words.h"
+
+namespace {
+
+// Quoted where the cell needs it. Names go out byte for byte, whatever their encoding.
+std::string cell(const std::string &value) {
+    if (value.find_first_of(",\"\r\n") == std::string::npos) return value;
+    std::string out = "\"";
+    for (const char c : value) {
+        if (c == '"') out += '"';
+        out += c;
+    }
+    return out + "\"";
+}
+
+std::string spaced(const std::vector<float> &times) {
+    std::string out;
+    for (const float time : times) out += (out.empty() ? "" : " ") + number_text(time);
+    return out;
+}
+
+}  // namespace
+
+std::string csv_head() {
+    return "file,mode,status,sample_rate,channels,duration_ms,hl_pos_ms,hl_end_ms,hl_refined,bpm,"
+           "beat_count,beats_ms,cpu_ms,error\n";
+}
+
+std::string csv_record(const record &result) {
+    const auto when = [](bool known, int64_t value) {
+        return known ? std::to_string(value) : std::string();
+    };
+    std::string row = cell(result.file);
+    row += std::string(",") + mode_word(result.mode) + "," + status_word(result.status);
+    row += "," + when(result.has_stream, result.sample_rate);
+    row += "," + when(result.has_stream, result.channels);
+    row += "," + when(result.has_stream, result.duration_ms);
+    row += "," + when(result.has_highlight, result.hl_pos_ms);
+    row += "," + when(result.has_highlight && result.length_s > 0,
+                      std::llround(highlight_end_ms(result, result.length_s)));
+    row += ",";
+    if (has_refinement(result)) row += is_refined(result) ? "true" : "false";
+    row += "," + when(result.has_beats, result.bpm);
+    row += "," + when(result.has_beats, static_cast<int64_t>(result.beats_ms.size()));
+    row += "," + spaced(result.beats_ms);
+    row += "," + when(result.cpu_ms >= 0, result.cpu_ms);
+    row += "," + cell(result.error);
+    return row + "\n";
+}

@@ -1,0 +1,54 @@
+#include <cmath>
+
+#include "cli/run/names.h"
+#include "cli/write/format.h"
+#include "cli/write/json.h"
+#include "cli/write/words.h"
+
+// A name that is not UTF-8 cannot stand in JSON: file then has U+FFFD in place of the bytes in
+// question, and file_bytes holds the exact name, percent-encoded.
+std::string json_record(const record &result) {
+    result_json object;
+    object["file"] = as_utf8(result.file);
+    if (!is_utf8(result.file)) object["file_bytes"] = percent_encoded(result.file);
+    object["mode"] = mode_word(result.mode);
+    object["status"] = status_word(result.status);
+    if (result.has_stream) {
+        object["sample_rate"] = result.sample_rate;
+        object["channels"] = result.channels;
+        object["duration_ms"] = result.duration_ms;
+    }
+    if (result.has_highlight) {
+        object["hl_pos_ms"] = result.hl_pos_ms;
+        if (result.length_s > 0) {
+            object["hl_end_ms"] = std::llround(highlight_end_ms(result, result.length_s));
+        }
+        if (has_refinement(result)) object["hl_refined"] = is_refined(result);
+    }
+    if (result.has_beats) {
+        object["bpm"] = result.bpm;
+        object["beat_count"] = result.beats_ms.size();
+        object["beats_ms"] = result.beats_ms;
+    }
+    if (result.cpu_ms >= 0) object["cpu_ms"] = result.cpu_ms;
+    if (!result.error.empty()) object["error"] = as_utf8(result.error);
+    return object.dump() + "\n";
+}
+
+record record_from_json(const std::string &text) {
+    const result_json object = result_json::parse(text);
+    record out =
+        failed_record("", mode_of(object.at("mode").get<std::string>()), object.value("error", ""));
+    if (object.at("status") == status_word(outcome::ok)) out.status = outcome::ok;
+    out.has_stream = object.contains("sample_rate");
+    out.sample_rate = object.value("sample_rate", 0);
+    out.channels = object.value("channels", 0);
+    out.duration_ms = object.value("duration_ms", int64_t{0});
+    out.has_highlight = object.contains("hl_pos_ms");
+    out.hl_pos_ms = object.value("hl_pos_ms", 0);
+    out.has_beats = object.contains("bpm");
+    out.bpm = object.value("bpm", 0);
+    if (out.has_beats) out.beats_ms = object.at("beats_ms").get<std::vector<float>>();
+    out.cpu_ms = object.value("cpu_ms", int64_t{-1});
+    return out;
+}

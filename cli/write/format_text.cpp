@@ -1,0 +1,28 @@
+#include "cli/run/names.h"
+#include "cli/write/format.h"
+#include "cli/write/words.h"
+
+namespace {
+
+std::string beats_lines(const record &result) {
+    std::string lines = "  tempo      " + tempo_text(result) + "\n";
+    lines += "  beats      " + std::to_string(result.beats_ms.size());
+    if (!result.beats_ms.empty()) {
+        lines += ", from " + clock_text(static_cast<double>(result.beats_ms.front())) + " to " +
+                 clock_text(static_cast<double>(result.beats_ms.back()));
+    }
+    return lines + "\n";
+}
+
+}  // namespace
+
+std::string text_record(const record &result) {
+    if (result.status != outcome::ok) return "";  // the message on standard error says it
+    std::string text = shown(result.file) + "\n  stream     " +
+                       clock_text(static_cast<double>(result.duration_ms)) + ", " +
+                       std::to_string(result.sample_rate) + " Hz, " +
+                       count_text(static_cast<size_t>(result.channels), "channel") + "\n";
+    if (result.has_highlight) text += "  highlight  " + highlight_text(result) + "\n";
+    if (result.has_beats) text += beats_lines(result);
+    return text;
+}

@@ -1,0 +1,67 @@
+#include "cli/write/markers.h"
+
+#include <array>
+#include <climits>
+#include <cstdio>
+
+#include "cli/run/names.h"
+
+namespace {
+
+struct marker_format {
+    result_format format;
+    const char *suffix;  // of the file's name
+    std::string (*content)(const record &result, const options &opts);
+};
+constexpr marker_format kMarkerFormats[] = {
+    {result_format::labels, ".labels.txt", audacity_labels},
+    {result_format::kdenlive, ".guides.txt", kdenlive_guides},
+    {result_format::losslesscut, ".losslesscut.csv", losslesscut_segments},
+    {result_format::ffmetadata, ".ffmetadata.txt", ffmetadata_chapters},
+    {result_format::edl, ".edl", edl_markers},
+    {result_format::fcpxml, ".fcpxml", fcpxml_markers},
+    {result_format::reaper, ".reaper.csv", reaper_markers},
+};
+constexpr int32_t kUsualLengthSeconds = 30;  // marked without --length: a preview's
+
+const marker_format *find_format(result_format format) {
+    for (const marker_format &entry : kMarkerFormats) {
+        if (entry.format == format) return &entry;
+    }
+    return nullptr;
+}
+
+}  // namespace
+
+bool writes_files(result_format format) {
+    return find_format(format) != nullptr;
+}
+
+std::string marker_path(const std::string &input, const options &opts) {
+    const std::string name = base_name(input);
+    const std::string folder = opts.output_dir.empty()
+                                   ? input.substr(0, input.size() - name.size())
+                                   : opts.output_dir + (opts.output_dir.back() == '/' ? "" : "/");
+    return folder + fitting_name(name, find_format(opts.format)->suffix);
+}
+
+std::string marker_content(const record &result, const options &opts) {
+    return find_format(opts.format)->content(result, opts);
+}
+
+double region_end_ms(const record &result) {
+    return highlight_end_ms(result, result.length_s > 0 ? result.length_s : kUsualLengthSeconds);
+}
+
+std::vector<mark> marks_of(const record &result) {
+    std::vector<mark> marks;
+    if (result.has_highlight) {
+        const auto start_ms = static_cast<double>(result.hl_pos_ms);
+        marks.push_back({start_ms, region_end_ms(result), "highlight"});
+    }
+    for (size_t i = 0; i < result.beats_ms.size(); ++i) {
+        const auto at = static_cast<double>(result.beats_ms[i]);
+        marks.push_back({at, at, "beat " + std::to_string(i + 1)});
+    }
+    return marks;
+}

@@ -1,0 +1,62 @@
+// Final Cut Pro's XML, version 1.8: a project with the song as its only clip, and markers on it.
+#include <algorithm>
+#include <cstdlib>
+#include <memory>
+
+#include "cli/report/svg.h"
+#include "cli/run/names.h"
+#include "cli/write/frame_rate.h"
+#include "cli/write/markers.h"
+
+namespace {
+
+// A whole number of frames as a fraction of seconds.
+std::string frames_text(int64_t frames, const frame_rate &rate) {
+    return std::to_string(frames * rate.seconds) + "/" + std::to_string(rate.frames) + "s";
+}
+
+std::string file_url(const std::string &path) {
+    const std::unique_ptr<char, decltype(&free)> whole(realpath(path.c_str(), nullptr), free);
+    return "file://" + percent_encoded(whole == nullptr ? path : whole.get());
+}
+
+}  // namespace
+
+std::string fcpxml_markers(const record &result, const options &opts) {
+    const frame_rate &rate = *find_frame_rate(opts.fps);
+    const std::string name = xml_attribute(base_name(result.file));
+    const std::string frame = frames_text(1, rate);
+    const std::string length = frames_text(
+        std::max<int64_t>(1, frame_at(static_cast<double>(result.duration_ms), rate)), rate);
+    std::string out =
+        "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<!DOCTYPE fcpxml>\n<fcpxml version=\"1.8\">\n"
+        "<resources>\n" +
+        element("format",
+                {{"id", "r1"}, {"frameDuration", frame}, {"width", "1920"}, {"height", "1080"}}) +
+        element("asset", {{"id", "r2"},
+                          {"name", name},
+                          {"src", file_url(result.file)},
+                          {"start", "0s"},
+                          {"duration", length},
+                          {"hasAudio", "1"},
+                          {"audioSources", "1"},
+                          {"audioChannels", std::to_string(result.channels)},
+                          {"audioRate", std::to_string(result.sample_rate)}}) +
+        "</resources>\n" + opened("project", {{"name", name}}) + ">\n" +
+        opened("sequence", {{"format", "r1"},
+                            {"duration", length},
+                            {"tcStart", "0s"},
+                            {"tcFormat", rate.drop ? "DF" : "NDF"}}) +
+        ">\n<spine>\n" +
+        opened("asset-clip",
+               {{"ref", "r2"}, {"name", name}, {"offset", "0s"}, {"duration", length}}) +
+        ">\n";
+    for (const mark &entry : marks_of(result)) {
+        const int64_t start = frame_at(entry.start_ms, rate);
+        const int64_t frames = std::max<int64_t>(1, frame_at(entry.end_ms, rate) - start);
+        out += element("marker", {{"start", frames_text(start, rate)},
+                                  {"duration", frames_text(frames, rate)},
+                                  {"value", entry.name}});
+    }
+    return out + "</asset-clip>\n</spine>\n</sequence>\n</project>\n</fcpxml>\n";
+}

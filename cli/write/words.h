@@ -1,0 +1,34 @@
+// Words and sentences that several parts of the command use.
+#ifndef TAVO_CLI_WRITE_WORDS_H
+#define TAVO_CLI_WRITE_WORDS_H
+
+#include <cstdint>
+#include <string>
+
+#include "cli/run/record.h"
+
+// Words of the interface: highlight, beats, both; ok, failed, stopped.
+const char *mode_word(int32_t mode);
+int32_t mode_of(const std::string &word);  // TAVO_MODE_*; the words' inverse
+const char *status_word(outcome status);
+
+// m:ss.t, or h:mm:ss.t from an hour on; whole_clock_text leaves out the tenths.
+std::string clock_text(double ms);
+std::string whole_clock_text(double ms);
+
+// "0:30.2 to 1:00.2"; "about 0:36" when the start is not refined.
+std::string highlight_text(const record &result);
+
+// "117 BPM", in mode both "117 BPM from the highlight on".
+std::string tempo_text(const record &result);
+
+// The shortest decimal that gives the same float again.
+std::string number_text(float value);
+
+// "1 file", "2 files".
+std::string count_text(size_t count, const char *noun);
+
+// "subject: reason of the system." from an errno value.
+std::string system_sentence(const std::string &subject, int code);
+
+#endif

@@ -1,0 +1,173 @@
+/** @file
+ * The public C interface of libtavo: the highlight and the beats of a song.
+ *
+ * In: the path of an audio file and an analysis mode. Out: one TAVO_INFO, delivered once through a
+ * callback on a thread of the library. A whole program:
+ *
+ * @code{.c}
+ * #include <semaphore.h>
+ * #include <stdio.h>
+ * #include <tavo.h>
+ *
+ * static sem_t done;
+ *
+ * static void on_result(TAVO_INFO *info) {
+ *     if (info->status == 0) printf("%d\n", (int)info->hl_pos);
+ *     sem_post(&done);
+ * }
+ *
+ * int main(int argc, char **argv) {
+ *     fnamedec = "";  // write no click track
+ *     TAVO_PARAM param = {argc > 1 ? argv[1] : "song.wav", TAVO_MODE_HIGHLIGHT};
+ *     int32_t err;
+ *     TAVO_CTX *tavo = tavo_init(&param, &err);
+ *     if (tavo == NULL) return 1;
+ *     sem_init(&done, 0, 0);
+ *     tavo_setcallback(tavo, on_result);
+ *     if (tavo_analyze(tavo, 30, 0, 0) == 0) sem_wait(&done);
+ *     tavo_deinit(tavo);
+ *     return 0;
+ * }
+ * @endcode
+ *
+ * What it does not do: it does not analyse two files at a time in one process, take audio from
+ * memory, or report progress. Use several processes for several files.
+ *
+ * States of an instance, and what each call returns in it:
+ *
+ * | state      | tavo_analyze | tavo_deinit                                                     |
+ * |------------|--------------|-----------------------------------------------------------------|
+ * | 1 ready    | starts, 0    | releases, 0                                                     |
+ * | 2 running  | -5           | raises the stop flag, waits for the job's callback, releases, 0 |
+ * | 3 finished | -5           | releases, 0                                                     |
+ * | 4 failed   | -5           | releases, 0                                                     |
+ *
+ * Threads: call the functions from one thread, or from several that take turns. The callback runs
+ * on a thread of the library; there, the tavo_get_ functions and tavo_has_audio are allowed and
+ * tavo_deinit returns -4.
+ *
+ * Binary compatibility: within one major version, functions, codes and the fields of TAVO_PARAM and
+ * TAVO_INFO keep their meaning, order and size; a minor version adds functions only. The library's
+ * file name ends in the major version. Other exported names serve the library and its tests and
+ * carry no such promise.
+ */
+#ifndef TAVO_H
+#define TAVO_H
+
+#include <stdint.h>
+
+#define TAVO_VERSION_MAJOR 1 /**< breaks programs when it changes */
+#define TAVO_VERSION_MINOR 0 /**< adds functions */
+#define TAVO_VERSION_PATCH 0 /**< changes no declaration */
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/** What an instance finds. */
+enum {
+    TAVO_MODE_HIGHLIGHT = 0, /**< the start of the highlight */
+    TAVO_MODE_BEATS = 1,     /**< the beats and the tempo of the whole file */
+    TAVO_MODE_BOTH = 2       /**< the highlight, then the beats and the tempo from there on */
+};
+
+/** Return codes. */
+enum {
+    TAVO_OK = 0,             /**< done or started */
+    TAVO_ERR_BUSY = -1,      /**< the Java bridge already holds an instance */
+    TAVO_ERR_MEMORY = -2,    /**< out of memory, or a thread could not be started */
+    TAVO_ERR_FORMAT = -3,    /**< unusable file: format, stream parameters, length, rate */
+    TAVO_ERR_HANDLE = -4,    /**< bad handle or argument; from tavo_init: the file is unusable */
+    TAVO_ERR_NOT_READY = -5, /**< tavo_analyze on an instance whose job was started before */
+    TAVO_ERR_READ = -6,      /**< a media source could not read or decode */
+    TAVO_ERR_OPEN = -7,      /**< a file cannot be opened or has no usable audio stream */
+    TAVO_ERR_CODEC = -255    /**< the codec library could not be set up or has no decoder */
+};
+
+/** One analysis, from tavo_init to tavo_deinit. Its fields are private. */
+typedef struct TAVO_CTX TAVO_CTX;
+
+/** The input of tavo_init. Owned by the caller and not read after tavo_init has returned. */
+typedef struct TAVO_PARAM {
+    const char *path; /**< NUL-terminated, UTF-8, at most 511 bytes */
+    int32_t mode;     /**< TAVO_MODE_* */
+} TAVO_PARAM;
+
+/** The result. The record and its array belong to the instance and are valid until tavo_deinit. */
+typedef struct TAVO_INFO {
+    int32_t hl_pos;     /**< highlight start, ms from the start of the file; 0 in mode 1 */
+    int32_t beat_count; /**< entries of beat_times; 0 on failure and in mode 0 */
+    float *beat_times;  /**< [beat_count] ms from the start of the file, ascending; or null */
+    int32_t status;     /**< 0 result, -1 failure */
+} TAVO_INFO;
+
+/** Receives the result, once per job, on the job's worker thread. Must not call tavo_deinit, which
+ * returns -4 there: let another thread do it. */
+typedef void (*TAVO_CALLBACK)(TAVO_INFO *info);
+
+/** Opens the file, reads its format and plans the decoding.
+ *
+ * Only one instance may exist in a process, and the caller must see to it: a second tavo_init
+ * before the tavo_deinit of the first succeeds, but the two share their locks and may wait for
+ * ever.
+ *
+ * Returns the instance, owned by the caller until tavo_deinit, with *err 0. On failure returns
+ * null, releases everything, and sets *err to -2 (out of memory) or -4 (the file cannot be used,
+ * whatever the reason). For the reason, call mtsrc_init of <media_source/mtsrc.h> with the same
+ * path; it returns null with one of these codes:
+ * - -3: the format is unknown or refused, its sample rate or coding is not supported, or the path
+ * has 512 bytes or more;
+ * - -6: the file cannot be read, or is shorter than 16 bytes;
+ * - -7: the file cannot be opened, or has no usable audio stream;
+ * - -255: the codec library failed.
+ *
+ * If mtsrc_init succeeds (release it with mtsrc_deinit), the audio lasts 1 s or less, its rate is
+ * below 8000 Hz, or there was too little memory. That header is C++; examples/analyze_file.c shows
+ * the three lines that a C program needs instead. */
+TAVO_CTX *tavo_init(const TAVO_PARAM *param, int32_t *err);
+
+/** Stores the callback. Call it before tavo_analyze. Checks nothing. */
+void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback);
+
+/** Starts the one job of the instance on a thread of its own and returns at once.
+ * - hl_param: the highlight length wanted, in seconds; 0 or less for none (modes 0 and 2).
+ * - max_beats: maximum number of threshold-selected beats; 0 or less for no limit (modes 1 and 2).
+ * - beat_param2: not used.
+ *
+ * Returns 0 started; -2 the thread could not be started (the instance stays ready); -4 bad handle,
+ * or a mode outside 0 to 2; -5 started before. The callback is called only after a 0. */
+int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_beats, int32_t beat_param2);
+
+/** Stops a running job, waits until its callback has returned, and releases the instance. A stop
+ * takes as long as decoding and the highlight search still need.
+ * Returns 0; -4 bad handle, or called from inside the callback (nothing is changed). */
+int32_t tavo_deinit(TAVO_CTX *ctx);
+
+/** The stream's sample rate in Hz, the channels that its decoder gives, and its duration in ms as
+ * the file states it. A null pointer leaves that value out. Known as soon as tavo_init has
+ * returned. Returns 0; -4 bad handle (nothing is written). */
+int32_t tavo_get_stream(const TAVO_CTX *ctx, int32_t *rate, int32_t *channels,
+                        int64_t *duration_ms);
+
+/** The tempo in beats per minute, once a job of mode 1 or 2 has succeeded: call it in the callback
+ * or after it. Mode 2 takes the tempo of the music from the highlight on. Returns 30 to 200; 0
+ * before the job's end, after a failure, in mode 0, or for a bad handle. */
+int32_t tavo_get_tempo(const TAVO_CTX *ctx);
+
+/** Whether the job could decode any audio: call it in the callback or after it. A highlight at 0 of
+ * a file without any is no result. Returns 1; 0 before the job's end, if nothing was decoded, or
+ * for a bad handle. */
+int32_t tavo_has_audio(const TAVO_CTX *ctx);
+
+/** The path of the diagnostic click track (mono 16-bit WAV at 11025 Hz), which modes 1 and 2 write
+ * at the end of every beat analysis, overwriting the file. By default it names a file in the
+ * working directory. A program that wants no file sets an empty path, one that wants it elsewhere
+ * another path, before tavo_analyze and not while a job runs. The string is not copied and not
+ * freed. */
+extern const char *fnamedec;
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif
