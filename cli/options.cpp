@@ -11,7 +11,7 @@
 
 #include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 #include "include/tavo.h"
 
 namespace {

@@ -10,7 +10,7 @@
 
 #include "cli/input/recognise.h"
 #include "cli/input/wav_header.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 #include "common/limits.h"
 #include "media_source/mtsrc.h"
 
@@ -105,10 +105,10 @@ std::string explain_before_open(const std::string &path) {
     return "";
 }
 
-std::string explain_unusable(const std::string &library_path, int32_t code, record &result) {
+std::string explain_unusable(const std::string &path, int32_t code, record &result) {
     if (code == TAVO_ERR_MEMORY) return "There is not enough memory to analyse the file.";
     int32_t type = kMtsrcTypeUnknown;
-    const int recognised = recognise(library_path, type);
+    const int recognised = recognise(path, type);
     if (recognised > 0) return system_sentence("The file cannot be read", recognised);
     if (recognised < 0) return "The file cannot be read far enough to recognise its format.";
     if (type == kMtsrcTypeUnknown) return "The file is not recognised as audio of a known format.";
@@ -116,10 +116,10 @@ std::string explain_unusable(const std::string &library_path, int32_t code, reco
         return std::string("The file is ") + type_name(type) + ", a format that is refused." +
                kConvert;
     }
-    const mtsrc_param param{library_path.c_str()};
+    const mtsrc_param param{path.c_str()};
     int32_t error = 0;
     mtsrc_ctx *source = mtsrc_init(&param, &error);
-    if (source == nullptr) return explain_source_code(library_path, type, error);
+    if (source == nullptr) return explain_source_code(path, type, error);
     mtsrc_format format{};
     mtsrc_getstream_format(source, &format);
     mtsrc_deinit(source);

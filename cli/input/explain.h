@@ -12,8 +12,8 @@
 // sufficient size. Never blocks, whatever kind of file it is.
 std::string explain_before_open(const std::string &path);
 
-// After tavo_init has failed with code. library_path is the name the library was given. Fills
+// After tavo_init has failed with code. path is the one that the library was given. Fills
 // what is known of the stream into result.
-std::string explain_unusable(const std::string &library_path, int32_t code, record &result);
+std::string explain_unusable(const std::string &path, int32_t code, record &result);
 
 #endif

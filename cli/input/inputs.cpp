@@ -8,9 +8,9 @@
 #include <functional>
 
 #include "cli/input/recognise.h"
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 #include "cli/write/markers.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 #include "media_source/mtsrc.h"
 
 namespace {

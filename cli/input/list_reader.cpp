@@ -10,8 +10,8 @@
 #include <climits>
 
 #include "cli/input/recognise.h"
-#include "cli/run/names.h"
-#include "cli/write/words.h"
+#include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 #include "common/limits.h"
 #include "media_source/mtsrc.h"
 

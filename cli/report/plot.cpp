@@ -2,7 +2,7 @@
 
 #include <sys/stat.h>
 
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 #include "cli/write/output_file.h"
 
 std::string check_plot(const std::string &target, const std::string &input, bool force) {

@@ -6,7 +6,7 @@
 #include <cstdlib>
 #include <memory>
 
-#include "cli/input/library_path.h"
+#include "cli/input/short_path.h"
 #include "cli/report/plot.h"
 #include "common/tavo_ctx.h"
 #include "highlight/power_envelope.h"
@@ -155,9 +155,9 @@ void fill_plot(const record &result, const reading &from, int columns, plot_data
 outcome gather_plot(const record &result, int columns, int stop_fd, plot_data &out,
                     std::string &error) {
     reading from;
-    library_path opened = open_library_path(result.file);
+    short_path opened = open_short_path(result.file);
     const outcome end = read_sound(opened.path, result.sample_rate, stop_fd, from);
-    close_library_path(opened);
+    close_short_path(opened);
     if (end == outcome::stopped) {
         error = "The analysis was stopped.";
         return end;

@@ -5,8 +5,8 @@
 
 #include "cli/report/plot.h"
 #include "cli/report/svg.h"
-#include "cli/run/names.h"
-#include "cli/write/words.h"
+#include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

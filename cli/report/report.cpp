@@ -12,10 +12,10 @@
 
 #include "cli/input/recognise.h"
 #include "cli/report/report_pages.h"
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 #include "cli/write/json.h"
 #include "cli/write/markers.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 #include "media_source/mtsrc.h"
 
 namespace {

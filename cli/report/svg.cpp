@@ -3,7 +3,7 @@
 #include <array>
 #include <charconv>
 
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 
 std::string decimal(double value, int digits) {
     std::array<char, 400> text{};  // the largest double has 309 digits before the point

@@ -8,10 +8,10 @@
 #include <cerrno>
 
 #include "cli/input/explain.h"
-#include "cli/input/library_path.h"
+#include "cli/input/short_path.h"
 #include "cli/write/click.h"
 #include "cli/write/markers.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 #include "include/tavo.h"
 
 namespace {
@@ -90,7 +90,7 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
     close(done_pipe[1]);
 }
 
-void analyse_opened(const library_path &opened, const options &opts, int stop_fd, record &out) {
+void analyse_opened(const short_path &opened, const options &opts, int stop_fd, record &out) {
     const TAVO_PARAM param = {opened.path.c_str(), opts.mode};
     int32_t code = TAVO_OK;
     TAVO_CTX *ctx = tavo_init(&param, &code);
@@ -120,11 +120,11 @@ record analyse(const std::string &path, const options &opts, int stop_fd) {
     out.error = begin_click(click, opts.click, path, opts.force);
     if (!out.error.empty()) return out;
 
-    library_path opened = open_library_path(path);
+    short_path opened = open_short_path(path);
     const int64_t before_ms = cpu_time_ms();
     analyse_opened(opened, opts, stop_fd, out);
     out.cpu_ms = cpu_time_ms() - before_ms;
-    close_library_path(opened);
+    close_short_path(opened);
     std::string cue;
     if (opts.format == result_format::cue) {
         cue = cue_chunks(out);

@@ -11,11 +11,11 @@
 #include <random>
 
 #include "cli/input/list_reader.h"
-#include "cli/run/names.h"
 #include "cli/run/stop.h"
 #include "cli/run/workers.h"
 #include "cli/store/store.h"
-#include "cli/write/words.h"
+#include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

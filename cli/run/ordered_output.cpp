@@ -8,7 +8,7 @@
 
 #include "cli/run/stop.h"
 #include "cli/write/format.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

@@ -8,7 +8,7 @@
 #include <cstdio>
 #include <string>
 
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

@@ -10,7 +10,7 @@
 #include "cli/report/plot.h"
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 #include "cli/write/format.h"
 #include "cli/write/markers.h"
 #include "cli/write/output_file.h"

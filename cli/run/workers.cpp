@@ -17,7 +17,7 @@
 #include "cli/run/stop.h"
 #include "cli/run/worker.h"
 #include "cli/store/keeper.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

@@ -4,10 +4,10 @@
 
 #include <algorithm>
 
-#include "cli/run/names.h"
 #include "cli/run/stop.h"
 #include "cli/run/worker.h"
-#include "cli/write/words.h"
+#include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

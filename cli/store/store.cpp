@@ -9,8 +9,8 @@
 #include <cerrno>
 #include <ctime>
 
-#include "cli/run/names.h"
-#include "cli/write/words.h"
+#include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

@@ -8,8 +8,8 @@
 #include <cerrno>
 #include <cstdint>
 
-#include "cli/run/names.h"
-#include "cli/write/words.h"
+#include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 #include "include/tavo.h"
 
 namespace {

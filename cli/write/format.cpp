@@ -1,6 +1,6 @@
 #include "cli/write/format.h"
 
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 
 std::string format_head(result_format format) {
     return format == result_format::csv ? csv_head() : "";

@@ -1,7 +1,7 @@
 #include <cmath>
 
 #include "cli/write/format.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

@@ -1,9 +1,9 @@
 #include <cmath>
 
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 #include "cli/write/format.h"
 #include "cli/write/json.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 
 // A name that is not UTF-8 cannot stand in JSON: file then has U+FFFD in place of the bytes in
 // question, and file_bytes holds the exact name, percent-encoded.

@@ -1,6 +1,6 @@
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 #include "cli/write/format.h"
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

@@ -4,7 +4,7 @@
 #include <climits>
 #include <cstdio>
 
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 
 namespace {
 

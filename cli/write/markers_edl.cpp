@@ -3,7 +3,7 @@
 #include <array>
 #include <cstdio>
 
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 #include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
 

@@ -4,7 +4,7 @@
 #include <memory>
 
 #include "cli/report/svg.h"
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 #include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
 

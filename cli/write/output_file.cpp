@@ -10,8 +10,8 @@
 #include <cstdio>
 #include <cstdlib>
 
-#include "cli/run/names.h"
-#include "cli/write/words.h"
+#include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 
 namespace {
 

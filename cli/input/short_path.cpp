@@ -1,11 +1,11 @@
-#include "cli/input/library_path.h"
+#include "cli/input/short_path.h"
 
 #include <fcntl.h>
 #include <unistd.h>
 
 #include "common/limits.h"
 
-library_path open_library_path(const std::string &path) {
+short_path open_short_path(const std::string &path) {
     if (path == "fd") return {"./fd", -1};  // "fd" alone means a descriptor
     if (path.size() < kPathBytes) return {path, -1};
     const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
@@ -13,7 +13,7 @@ library_path open_library_path(const std::string &path) {
     return {"/proc/self/fd/" + std::to_string(fd), fd};
 }
 
-void close_library_path(library_path &opened) {
+void close_short_path(short_path &opened) {
     if (opened.fd >= 0) close(opened.fd);
     opened.fd = -1;
 }

@@ -1,4 +1,4 @@
-#include "cli/write/words.h"
+#include "cli/write/value_text.h"
 
 #include <array>
 #include <cctype>

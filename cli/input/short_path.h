@@ -1,16 +1,16 @@
 // The library takes paths of at most 511 bytes and treats the path "fd" specially.
-#ifndef TAVO_CLI_INPUT_LIBRARY_PATH_H
-#define TAVO_CLI_INPUT_LIBRARY_PATH_H
+#ifndef TAVO_CLI_INPUT_SHORT_PATH_H
+#define TAVO_CLI_INPUT_SHORT_PATH_H
 
 #include <string>
 
-struct library_path {
+struct short_path {
     std::string path;  // for the library
     int fd = -1;       // kept open while path is used, -1 for none
 };
 
 // Never fails: where nothing helps, the path stays as it is and the library refuses it.
-library_path open_library_path(const std::string &path);
-void close_library_path(library_path &opened);
+short_path open_short_path(const std::string &path);
+void close_short_path(short_path &opened);
 
 #endif

@@ -1,6 +1,6 @@
 // Words and sentences that several parts of the command use.
-#ifndef TAVO_CLI_WRITE_WORDS_H
-#define TAVO_CLI_WRITE_WORDS_H
+#ifndef TAVO_CLI_WRITE_VALUE_TEXT_H
+#define TAVO_CLI_WRITE_VALUE_TEXT_H
 
 #include <cstdint>
 #include <string>

@@ -1,4 +1,4 @@
-#include "cli/run/names.h"
+#include "cli/write/file_names.h"
 
 #include <array>
 #include <climits>

@@ -1,6 +1,6 @@
 // File names are bytes. These functions turn them into text for people, for JSON and for URLs.
-#ifndef TAVO_CLI_RUN_NAMES_H
-#define TAVO_CLI_RUN_NAMES_H
+#ifndef TAVO_CLI_WRITE_FILE_NAMES_H
+#define TAVO_CLI_WRITE_FILE_NAMES_H
 
 #include <string>
 
