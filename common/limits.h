@@ -5,10 +5,10 @@
 
 #include "common/tavo_ctx.h"
 
-constexpr int32_t kPathBytes = 512;                 // room for a path with its terminator
-constexpr int32_t kHeadBytes = 16;                  // read to recognise a format
-constexpr int32_t kMinRate = 8000;                  // Hz
-constexpr int32_t kMaxRate = 48'000;                // Hz, of all formats but FLAC
-constexpr int64_t kRefusedUnits = kUnitsPerSecond;  // streams up to this length are too short
+constexpr int32_t kPathBytes = TAVO_PATH_BYTES;
+constexpr int32_t kHeadBytes = TAVO_MIN_FILE_BYTES;  // read to recognise a format
+constexpr int32_t kMinRate = TAVO_MIN_RATE;          // Hz
+constexpr int32_t kMaxRate = TAVO_MAX_RATE;          // Hz, of all formats but FLAC
+constexpr int64_t kRefusedUnits = kUnitsPerSecond;   // streams up to this length are too short
 
 #endif

@@ -7,17 +7,31 @@
 #include "common/alloc.h"
 #include "highlight/position.h"
 #include "pcm/decode.h"
+#include "pcm/read_pcm.h"
 
 namespace {
 
 constexpr char kMark[4] = {'Z', 'E', 'K', 'A'};
+
+// The result record of an instance made here, and who listens to it.
+struct result_record {
+    TAVO_INFO info;  // first: TAVO_CTX.info points to it
+    TAVO_LISTENER listener;
+    void *user;  // the host's
+};
+
+// The callback of an instance that has a listener.
+void call_listener(TAVO_INFO *info) {
+    const auto *record = reinterpret_cast<const result_record *>(info);
+    record->listener(info, record->user);
+}
 
 // The instance with its result record and the sub-contexts of its mode, or null.
 TAVO_CTX *new_instance(int32_t mode) {
     auto *ctx = zeroed_items<TAVO_CTX>(1);
     if (ctx == nullptr) return nullptr;
     ctx->mode = mode;
-    ctx->info = zeroed_items<TAVO_INFO>(1);
+    ctx->info = reinterpret_cast<TAVO_INFO *>(zeroed_items<result_record>(1));
     bool complete = ctx->info != nullptr;
     if (complete && finds_beats(mode)) {
         ctx->onset = zeroed_items<TAVO_ONSET_CTX>(1);
@@ -78,6 +92,15 @@ extern "C" void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback) {
     ctx->callback = callback;
 }
 
+extern "C" int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user) {
+    if (!is_instance(ctx)) return TAVO_ERR_HANDLE;
+    auto *record = reinterpret_cast<result_record *>(ctx->info);
+    record->listener = listener;
+    record->user = user;
+    ctx->callback = listener == nullptr ? nullptr : call_listener;
+    return TAVO_OK;
+}
+
 extern "C" int32_t tavo_get_stream(const TAVO_CTX *ctx, int32_t *rate, int32_t *channels,
                                    int64_t *duration_ms) {
     if (!is_instance(ctx)) return TAVO_ERR_HANDLE;
@@ -95,4 +118,14 @@ extern "C" int32_t tavo_get_tempo(const TAVO_CTX *ctx) {
 
 extern "C" int32_t tavo_has_audio(const TAVO_CTX *ctx) {
     return is_instance(ctx) && has_ended(ctx) && ctx->pcm_bytes > 0 ? 1 : 0;
+}
+
+extern "C" int32_t tavo_is_complete(const TAVO_CTX *ctx) {
+    return is_instance(ctx) && has_ended(ctx) && !has_read_failed() ? 1 : 0;
+}
+
+extern "C" const float *tavo_get_loudness(const TAVO_CTX *ctx, int32_t *count) {
+    const bool known = is_instance(ctx) && ctx->hl != nullptr && has_ended(ctx);
+    *count = known && ctx->hl->power != nullptr ? ctx->hl->power_count : 0;
+    return *count > 0 ? ctx->hl->power : nullptr;
 }

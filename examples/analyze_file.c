@@ -9,47 +9,34 @@
 #include <stdlib.h>
 #include <tavo.h>
 
-/* From <media_source/mtsrc.h>, which is C++: the code for which a file cannot be used. */
-struct mtsrc_param {
-    const char *path;
-};
-struct mtsrc_ctx *mtsrc_init(const struct mtsrc_param *param, int32_t *err);
-int32_t mtsrc_deinit(struct mtsrc_ctx *src);
-
-/* Handed from the library's thread to the main thread. It is static because the callback gets no
- * pointer of ours; one is enough, as there is one analysis in a process. */
-static struct {
+/* Passed from the library's thread to the main thread. */
+struct result {
     pthread_mutex_t lock;
     pthread_cond_t changed;
-    TAVO_INFO *info; /* null until the result is there; the library's until tavo_deinit */
-} result = {PTHREAD_MUTEX_INITIALIZER, PTHREAD_COND_INITIALIZER, NULL};
+    TAVO_INFO *info; /* null until the job has ended; owned by the library, until tavo_deinit */
+};
 
 /* Runs on a thread of the library, where tavo_deinit is not allowed. */
-static void on_result(TAVO_INFO *info) {
-    pthread_mutex_lock(&result.lock);
-    result.info = info;
-    pthread_cond_signal(&result.changed);
-    pthread_mutex_unlock(&result.lock);
+static void on_result(TAVO_INFO *info, void *user) {
+    struct result *result = user;
+    pthread_mutex_lock(&result->lock);
+    result->info = info;
+    pthread_cond_signal(&result->changed);
+    pthread_mutex_unlock(&result->lock);
 }
 
-static const TAVO_INFO *wait_for_result(void) {
-    pthread_mutex_lock(&result.lock);
-    while (result.info == NULL) pthread_cond_wait(&result.changed, &result.lock);
-    pthread_mutex_unlock(&result.lock);
-    return result.info;
+static const TAVO_INFO *wait_for_result(struct result *result) {
+    pthread_mutex_lock(&result->lock);
+    while (result->info == NULL) pthread_cond_wait(&result->changed, &result->lock);
+    pthread_mutex_unlock(&result->lock);
+    return result->info;
 }
 
-/* tavo_init has one code for every unusable file: the media source knows the reason. */
+/* tavo_init has one code for every unusable file; tavo_probe returns the reason. */
 static int print_reason(const char *path) {
-    const struct mtsrc_param param = {path};
-    int32_t reason = TAVO_OK;
-    struct mtsrc_ctx *source = mtsrc_init(&param, &reason);
-    if (source != NULL) {
-        mtsrc_deinit(source);
-        fprintf(stderr, "analyze_file: %s is too short or its sample rate too low\n", path);
-    } else {
-        fprintf(stderr, "analyze_file: %s cannot be used (%d)\n", path, (int)reason);
-    }
+    int32_t code = tavo_probe(path, NULL);
+    if (code == TAVO_OK) code = TAVO_ERR_MEMORY;
+    fprintf(stderr, "analyze_file: %s: %s (%d)\n", path, tavo_error_text(code), (int)code);
     return EXIT_FAILURE;
 }
 
@@ -60,6 +47,10 @@ static int print_result(const TAVO_CTX *tavo, const TAVO_INFO *info) {
     tavo_get_stream(tavo, &rate, &channels, &duration_ms);
     printf("stream %d Hz, channels %d, %lld ms\n", (int)rate, (int)channels,
            (long long)duration_ms);
+    if (!tavo_is_complete(tavo)) {
+        fputs("analyze_file: the file could not be read to its end\n", stderr);
+        return EXIT_FAILURE;
+    }
     if (info->status != 0) {
         fputs(tavo_has_audio(tavo) ? "analyze_file: no beats were found\n"
                                    : "analyze_file: no audio could be decoded\n",
@@ -83,13 +74,15 @@ int main(int argc, char **argv) {
     int32_t err = TAVO_OK;
     TAVO_CTX *tavo = tavo_init(&param, &err);
     if (tavo == NULL) return print_reason(argv[1]);
-    tavo_setcallback(tavo, on_result);
+    struct result result = {PTHREAD_MUTEX_INITIALIZER, PTHREAD_COND_INITIALIZER, NULL};
+    tavo_set_listener(tavo, on_result, &result);
     int status = EXIT_FAILURE;
     err = tavo_analyze(tavo, seconds, 0, 0);
     if (err == TAVO_OK) {
-        status = print_result(tavo, wait_for_result());
+        status = print_result(tavo, wait_for_result(&result));
     } else { /* no callback will come */
-        fprintf(stderr, "analyze_file: the analysis could not be started (%d)\n", (int)err);
+        fprintf(stderr, "analyze_file: the analysis could not be started: %s\n",
+                tavo_error_text(err));
     }
     tavo_deinit(tavo); /* releases the result as well */
     return status;

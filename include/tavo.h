@@ -43,8 +43,9 @@
  * | 4 failed   | -5           | releases, 0                                                     |
  *
  * Threads: call the functions from one thread, or from several that take turns. The callback runs
- * on a thread of the library; there, the tavo_get_ functions and tavo_has_audio are allowed and
- * tavo_deinit returns -4.
+ * on a thread of the library; there, the tavo_get_ functions, tavo_has_audio and tavo_is_complete
+ * are allowed and tavo_deinit returns -4. tavo_probe and tavo_error_text may be called on any
+ * thread, at any time.
  *
  * Binary compatibility: within one major version, functions, codes and the fields of TAVO_PARAM and
  * TAVO_INFO keep their meaning, order and size; a minor version adds functions only. The library's
@@ -81,7 +82,23 @@ enum {
     TAVO_ERR_NOT_READY = -5, /**< tavo_analyze on an instance whose job was started before */
     TAVO_ERR_READ = -6,      /**< a media source could not read or decode */
     TAVO_ERR_OPEN = -7,      /**< a file cannot be opened or has no usable audio stream */
+    TAVO_ERR_SHORT = -8,     /**< tavo_probe: the audio lasts 1 s or less */
+    TAVO_ERR_LOW_RATE = -9,  /**< tavo_probe: the sample rate is below TAVO_MIN_RATE */
     TAVO_ERR_CODEC = -255    /**< the codec library could not be set up or has no decoder */
+};
+
+/** Limits of what can be analysed. */
+enum {
+    TAVO_PATH_BYTES = 512,    /**< a path and its terminator fit into as many bytes */
+    TAVO_MIN_FILE_BYTES = 16, /**< bytes that a file needs to be recognised */
+    TAVO_MIN_RATE = 8000,     /**< lowest sample rate, Hz */
+    TAVO_MAX_RATE = 48000     /**< highest sample rate of every format but FLAC, Hz */
+};
+
+/** The loudness curve: one value for every hop, taken over a window that starts there. */
+enum {
+    TAVO_LOUDNESS_HOP_MS = 2000,   /**< from the start of one window to the start of the next */
+    TAVO_LOUDNESS_WINDOW_MS = 6000 /**< length of a window */
 };
 
 /** One analysis, from tavo_init to tavo_deinit. Its fields are private. */
@@ -101,9 +118,39 @@ typedef struct TAVO_INFO {
     int32_t status;     /**< 0 result, -1 failure */
 } TAVO_INFO;
 
+/** The audio stream of a file, as the file states it. */
+typedef struct TAVO_STREAM {
+    int32_t rate;        /**< sample rate in Hz */
+    int32_t channels;    /**< channels that the decoder gives */
+    int64_t duration_ms; /**< duration in ms, rounded down */
+} TAVO_STREAM;
+
 /** Receives the result, once per job, on the job's worker thread. Must not call tavo_deinit, which
  * returns -4 there: let another thread do it. */
 typedef void (*TAVO_CALLBACK)(TAVO_INFO *info);
+
+/** The same, with the pointer that was passed to tavo_set_listener. */
+typedef void (*TAVO_LISTENER)(TAVO_INFO *info, void *user);
+
+/** Opens a file, reads its format and closes it again: whether tavo_init can use the file, and if
+ * not, why. Needs no instance. *stream receives the stream if the result is 0, -8 or -9, and is
+ * zeroed otherwise; stream may be null.
+ *
+ * Returns 0 if the file can be used, or the reason why not:
+ * - -2: out of memory;
+ * - -3: the format is unknown or refused, its sample rate or coding is not supported, or the path
+ *   has 512 bytes or more;
+ * - -4: path is null;
+ * - -6: the file cannot be read, or is shorter than 16 bytes;
+ * - -7: the file cannot be opened, or has no usable audio stream;
+ * - -8: the audio lasts 1 s or less;
+ * - -9: the sample rate is below 8000 Hz;
+ * - -255: the codec library failed. */
+int32_t tavo_probe(const char *path, TAVO_STREAM *stream);
+
+/** An English clause for a return code, without a period at its end: "the file cannot be opened or
+ * has no audio stream". Never null; the string is static. */
+const char *tavo_error_text(int32_t code);
 
 /** Opens the file, reads its format and plans the decoding.
  *
@@ -113,21 +160,18 @@ typedef void (*TAVO_CALLBACK)(TAVO_INFO *info);
  *
  * Returns the instance, owned by the caller until tavo_deinit, with *err 0. On failure returns
  * null, releases everything, and sets *err to -2 (out of memory) or -4 (the file cannot be used,
- * whatever the reason). For the reason, call mtsrc_init of <media_source/mtsrc.h> with the same
- * path; it returns null with one of these codes:
- * - -3: the format is unknown or refused, its sample rate or coding is not supported, or the path
- * has 512 bytes or more;
- * - -6: the file cannot be read, or is shorter than 16 bytes;
- * - -7: the file cannot be opened, or has no usable audio stream;
- * - -255: the codec library failed.
- *
- * If mtsrc_init succeeds (release it with mtsrc_deinit), the audio lasts 1 s or less, its rate is
- * below 8000 Hz, or there was too little memory. That header is C++; examples/analyze_file.c shows
- * the three lines that a C program needs instead. */
+ * whatever the reason). tavo_probe with the same path returns the reason; if it returns 0, there
+ * was too little memory. */
 TAVO_CTX *tavo_init(const TAVO_PARAM *param, int32_t *err);
 
 /** Stores the callback. Call it before tavo_analyze. Checks nothing. */
 void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback);
+
+/** Stores a listener instead of a callback, and the pointer to pass to it, which the library does
+ * not read. Call it before tavo_analyze, on an instance that tavo_init returned; the later one of
+ * tavo_setcallback and tavo_set_listener counts. A null listener means none. Returns 0; -4 bad
+ * handle (nothing is stored). */
+int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 
 /** Starts the one job of the instance on a thread of its own and returns at once.
  * - hl_param: the highlight length wanted, in seconds; 0 or less for none (modes 0 and 2).
@@ -158,6 +202,19 @@ int32_t tavo_get_tempo(const TAVO_CTX *ctx);
  * a file without any is no result. Returns 1; 0 before the job's end, if nothing was decoded, or
  * for a bad handle. */
 int32_t tavo_has_audio(const TAVO_CTX *ctx);
+
+/** Whether the job decoded the file to its end: call it in the callback or after it. A result is
+ * delivered even if the file could not be read or memory ran out in the middle of it; it then holds
+ * for the part that was decoded. Returns 1; 0 before the job's end, if something is missing, or for
+ * a bad handle. */
+int32_t tavo_is_complete(const TAVO_CTX *ctx);
+
+/** The loudness curve of the file, once a job of mode 0 or 2 has ended: value i is taken over the
+ * window that starts at i * TAVO_LOUDNESS_HOP_MS. A value is 10 * log10(m + 1), m the mean square
+ * of the samples with full scale 1.0: 0 for silence, 3.01 for a square wave at full scale. Returns
+ * the curve, [*count] and valid until tavo_deinit; null with *count 0 before the job's end, in mode
+ * 1, for audio shorter than a window, or for a bad handle. count must not be null. */
+const float *tavo_get_loudness(const TAVO_CTX *ctx, int32_t *count);
 
 /** The path of the diagnostic click track (mono 16-bit WAV at 11025 Hz), which modes 1 and 2 write
  * at the end of every beat analysis, overwriting the file. By default it names a file in the

@@ -1,9 +1,8 @@
-# cmake --install. The public headers go to include/tavo, which both packages name as the include
-# folder: <tavo.h>, <media_source/mtsrc.h>. Whatever is installed finds the rest relative to itself.
+# cmake --install. The public header goes to include/tavo, which both packages name as the include
+# folder: <tavo.h>. Whatever is installed finds the rest relative to itself.
 set(headers_dir ${CMAKE_INSTALL_INCLUDEDIR}/tavo)
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/tavo)
 install(FILES include/tavo.h DESTINATION ${headers_dir})
-install(FILES media_source/mtsrc.h media_source/mtsrc_io.h DESTINATION ${headers_dir}/media_source)
 install(TARGETS tavo EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}
   INCLUDES DESTINATION ${headers_dir})
 

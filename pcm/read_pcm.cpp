@@ -2,14 +2,16 @@
 
 #include <algorithm>
 
-#include "include/tavo.h"
+#include "common/tavo_ctx.h"
 
 namespace {
 
-// Replies without a byte, in a row, after which a source is given up. No stream brings as many.
-constexpr int32_t kMaxEmptyReplies = 65'536;
+// Consecutive empty reads before giving up; far more than any real stream produces.
+constexpr int32_t kMaxEmptyReads = 65'536;
 
-// Any other code only says that a call brought what its byte count says.
+int32_t read_failed = 0;  // atomic access only: the segments' threads set it
+
+// Other codes are informational; the byte count is what matters.
 bool is_failure(int32_t result) {
     return result == TAVO_ERR_MEMORY || result == TAVO_ERR_HANDLE || result == TAVO_ERR_READ;
 }
@@ -18,17 +20,27 @@ bool is_failure(int32_t result) {
 
 int64_t read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity) {
     int64_t got = 0;
-    int32_t empty_replies = 0;
-    while (got < capacity && empty_replies < kMaxEmptyReplies) {
+    int32_t empty_reads = 0;
+    while (got < capacity) {
         const auto want = static_cast<int32_t>(std::min(capacity - got, kReadBytes));
         mtsrc_frame frame = {dst + got, 0};
         const int32_t result = mtsrc_getstream(src, want, &frame);
-        if (is_failure(result)) break;
-
         const int32_t delivered = std::clamp(frame.size, 0, want);
+        empty_reads = delivered > 0 ? 0 : empty_reads + 1;
+        if (is_failure(result) || empty_reads == kMaxEmptyReads) {
+            store_flag(&read_failed, 1);
+            break;
+        }
         got += delivered;
-        empty_replies = delivered > 0 ? 0 : empty_replies + 1;
         if (result == kMtsrcEndOfStream) break;
     }
     return got;
+}
+
+void clear_read_failure() {
+    store_flag(&read_failed, 0);
+}
+
+bool has_read_failed() {
+    return load_flag(&read_failed) != 0;
 }

@@ -19,7 +19,12 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     EXPECT_EQ(ctx->hl != nullptr ? ctx->hl->hl_param : 20, 20);
     EXPECT_EQ(ctx->onset != nullptr ? ctx->onset->max_beats : max_beats, max_beats);
     EXPECT_EQ(ctx->onset != nullptr ? ctx->onset->beat_param2 : 5, 5);
-    EXPECT_EQ(tavo_has_audio(ctx), 1);
+    EXPECT_TRUE(tavo_has_audio(ctx) == 1 && tavo_is_complete(ctx) == 1);
+    int32_t points = -1;
+    const float *loudness = tavo_get_loudness(ctx, &points);
+    EXPECT_EQ(loudness != nullptr, mode != TAVO_MODE_BEATS);
+    EXPECT_EQ(points, mode != TAVO_MODE_BEATS ? (100 - 6) / 2 + 1 : 0);
+    EXPECT_TRUE(loudness == nullptr || loudness[45 / 2] > 2 * loudness[35 / 2]);
     // The nearest periods of whole frames are 21 and 22, 123 and 117 BPM.
     EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);
     EXPECT_EQ(tavo_deinit(ctx), 0);
@@ -81,6 +86,7 @@ TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
             EXPECT_NEAR(result.hl_pos, decodes && mode != TAVO_MODE_BEATS ? 41'000 : 0, 400);
             EXPECT_STREQ(job::flaw_of(result, mode), nullptr);
             EXPECT_EQ(tavo_has_audio(ctx), decodes);
+            EXPECT_EQ(tavo_is_complete(ctx), decodes);
             EXPECT_EQ(tavo_get_tempo(ctx), 0);
             EXPECT_EQ(tavo_deinit(ctx), 0);
         });

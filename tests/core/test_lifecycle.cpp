@@ -3,6 +3,7 @@
 #include <cstring>
 #include <thread>
 
+#include "core/instance.h"
 #include "core/lifecycle.h"
 #include "media_source/mtsrc_ctx.h"
 #include "pcm/decode.h"
@@ -31,7 +32,7 @@ TEST(Lifecycle, CreationMakesWhatTheModeNeeds) {
         EXPECT_EQ(tavo_get_stream(ctx, nullptr, nullptr, nullptr), 0);
         EXPECT_TRUE(rate == 22050 && channels == 1 && ms == 100'000);
         EXPECT_EQ(tavo_get_tempo(ctx), 0);
-        EXPECT_EQ(tavo_has_audio(ctx), 0);
+        EXPECT_TRUE(tavo_has_audio(ctx) == 0 && tavo_is_complete(ctx) == 0);
         EXPECT_EQ(_tavo_quit(ctx), 0);  // no job: nothing to stop
         EXPECT_EQ(ctx->quit, 0);
         EXPECT_EQ(tavo_deinit(ctx), 0);
@@ -63,6 +64,47 @@ TEST(Lifecycle, CreationFailsWithOneCode) {
     EXPECT_EQ(tavo_init(nullptr, nullptr), nullptr);
 }
 
+TEST(Probe, ReportsTheStreamOrWhyTheFileIsRefused) {
+    const core_song::file short_song(support::make_song({8000, 1, 1.0, 120.0, 1, 0.0}));
+    const core_song::file low_rate(support::make_song({7999, 2, 2.0, 120.0, 1, 0.0}));
+    const struct {
+        std::string path;
+        int32_t code;
+        TAVO_STREAM stream;
+    } cases[] = {
+        {core_song::whole().path, TAVO_OK, {22050, 1, 100'000}},
+        {short_song.path, TAVO_ERR_SHORT, {8000, 1, 1000}},
+        {low_rate.path, TAVO_ERR_LOW_RATE, {7999, 2, 2000}},
+        {core_song::whole().path + ".missing", TAVO_ERR_OPEN, {}},
+        {testing::TempDir(), TAVO_ERR_READ, {}},
+        {std::string(TAVO_PATH_BYTES, 'x'), TAVO_ERR_FORMAT, {}},
+    };
+    for (const auto &row : cases) {
+        SCOPED_TRACE(row.path);
+        TAVO_STREAM stream = {-1, -1, -1};
+        EXPECT_EQ(tavo_probe(row.path.c_str(), &stream), row.code);
+        EXPECT_EQ(tavo_probe(row.path.c_str(), nullptr), row.code);
+        EXPECT_TRUE(stream.rate == row.stream.rate && stream.channels == row.stream.channels &&
+                    stream.duration_ms == row.stream.duration_ms);
+        EXPECT_STRNE(tavo_error_text(row.code), tavo_error_text(1));
+    }
+    EXPECT_EQ(tavo_probe(nullptr, nullptr), TAVO_ERR_HANDLE);
+}
+
+TEST(Listener, IsCalledOnceWithTheHostsPointerInsteadOfTheCallback) {
+    for_each_mode(kModes, [](int32_t, TAVO_CTX *ctx) {
+        std::atomic<int> calls{0};
+        const auto count = [](TAVO_INFO *info, void *user) {
+            *static_cast<std::atomic<int> *>(user) += info->status == 0 ? 1 : 100;
+        };
+        EXPECT_EQ(tavo_set_listener(ctx, count, &calls), 0);
+        EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+        while (!has_ended(ctx)) std::this_thread::yield();
+        EXPECT_EQ(tavo_deinit(ctx), 0);
+        EXPECT_TRUE(calls == 1 && job::last.calls == 0);
+    });
+}
+
 TEST(Lifecycle, BadHandlesTouchNothing) {
     TAVO_CTX wrong{};
     memcpy(wrong.magic, "KOVA", 4);
@@ -73,7 +115,10 @@ TEST(Lifecycle, BadHandlesTouchNothing) {
         EXPECT_EQ(tavo_get_stream(ctx, &rate, nullptr, nullptr), -4);
         EXPECT_EQ(rate, 99);
         EXPECT_EQ(tavo_get_tempo(ctx), 0);
-        EXPECT_EQ(tavo_has_audio(ctx), 0);
+        EXPECT_TRUE(tavo_has_audio(ctx) == 0 && tavo_is_complete(ctx) == 0);
+        EXPECT_EQ(tavo_set_listener(ctx, nullptr, nullptr), -4);
+        EXPECT_EQ(tavo_get_loudness(ctx, &rate), nullptr);
+        EXPECT_EQ(rate, 0);
         EXPECT_EQ(_tavo_quit(ctx), -4);
         EXPECT_EQ(tavo_deinit(ctx), -4);
     }
