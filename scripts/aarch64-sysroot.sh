@@ -6,7 +6,7 @@ set -eu
 cd "$(dirname "$0")/.."
 root=$PWD/build/aarch64-sysroot
 packages='libc6-dev libstdc++-12-dev libavcodec-dev libavutil-dev libflac-dev libogg-dev libgtest-dev
-    libbenchmark-dev nlohmann-json3-dev'
+  libbenchmark-dev nlohmann-json3-dev'
 headers='android-libnativehelper-dev:amd64 android-liblog-dev:amd64' # built for amd64 alone
 [ -e "$root/.complete" ] && [ "$(cat "$root/.complete")" = "$packages $headers" ] && exit 0
 
@@ -35,7 +35,7 @@ apt-get -qq -y --download-only install $packages >/dev/null
 
 ln -s usr/lib "$root/lib"
 for package in "$apt"/archives/*.deb; do
-    dpkg-deb --fsys-tarfile "$package" | tar -x --keep-directory-symlink -C "$root"
+  dpkg-deb --fsys-tarfile "$package" | tar -x --keep-directory-symlink -C "$root"
 done
 rm -rf "$apt"
 echo "$packages $headers" >"$root/.complete"

@@ -15,11 +15,12 @@ tests=(
   python3 python3-numpy python3-selenium chromium chromium-driver sqlite3 clang-format clang-tidy
   ffmpeg flac lame vorbis-tools
   doxygen groff-base zsh fish
+  devscripts abigail-tools mypy python3-jsonschema python3-venv python3-pip python3-setuptools python3-wheel
 )
 cluster=(slurm-wlm munge postgresql postgresql-client) # scripts/test-cluster.sh
 fuzz=(clang libclang-rt-14-dev)
 measure=(clang libclang-rt-14-dev gcovr valgrind)
-package=(dpkg-dev file debootstrap) # scripts/test-package.sh
+package=(dpkg-dev debhelper lintian debootstrap) # scripts/test-package.sh, scripts/test-fresh.sh
 
 wanted=()
 for group in "${@:-build java tests fuzz}"; do

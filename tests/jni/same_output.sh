@@ -7,14 +7,14 @@ song=$2
 shift 2
 # shellcheck disable=SC2086 # the options are words
 for options in '--mode highlight --length 10' '--mode beats --max-beats 8' '--mode both --length 5'; do
-    native=$("$tavo" $options "$song" | grep -v -e '^  stream ' -e '^  tempo ')
-    printf '%s\n%s\n' "$options" "$native" | grep '[0-9]:[0-9]'
-    [ "$native" = "$("$@" $options "$song")" ]
+  native=$("$tavo" $options "$song" | grep -v -e '^  stream ' -e '^  tempo ')
+  printf '%s\n%s\n' "$options" "$native" | grep '[0-9]:[0-9]'
+  [ "$native" = "$("$@" $options "$song")" ]
 done
 # A file that cannot be analysed: status 1 and nothing on standard output. Wrong usage: 2.
 # shellcheck disable=SC2086
 for wrong in '1 /nowhere/song.wav' '2 --mode loud song.wav'; do
-    status=0
-    output=$("$@" ${wrong#* } 2>/dev/null) || status=$?
-    [ "$status $output" = "${wrong%% *} " ]
+  status=0
+  output=$("$@" ${wrong#* } 2>/dev/null) || status=$?
+  [ "$status $output" = "${wrong%% *} " ]
 done
