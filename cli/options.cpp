@@ -80,7 +80,6 @@ constexpr format_word kFormats[] = {
     {"edl", result_format::edl},
     {"fcpxml", result_format::fcpxml},
     {"reaper", result_format::reaper},
-    {"cue", result_format::cue},
 };
 
 std::vector<std::string> format_words() {
@@ -154,9 +153,8 @@ void declare_output(CLI::App &app, options &out, raw_values &raw) {
     app.add_option("-f,--format", raw.format,
                    "text (default) for people, json: one object a line, csv: one row a file; or "
                    "markers for an editor, a file beside each input: labels (Audacity), kdenlive, "
-                   "losslesscut, ffmetadata (chapters), edl (DaVinci Resolve), fcpxml, reaper; "
-                   "or cue: inside the track of --click. Markers span 30 s of highlight without "
-                   "--length")
+                   "losslesscut, ffmetadata (chapters), edl (DaVinci Resolve), fcpxml, reaper. "
+                   "Markers span 30 s of highlight without --length")
         ->check(CLI::IsMember(format_words()).description(""))
         ->type_name("FORMAT");
     app.add_option("-o,--output-dir", out.output_dir,
@@ -291,9 +289,6 @@ std::string contradiction(const options &out, const raw_values &raw) {
     if (!raw.fps.empty() && out.format != result_format::edl &&
         out.format != result_format::fcpxml) {
         return "--fps goes with --format edl and fcpxml, which count in frames.";
-    }
-    if (out.format == result_format::cue && out.click.empty()) {
-        return "--format cue marks the track of --click: give both.";
     }
     if (out.skip_existing && !writes_files(out.format)) {
         return "--skip-existing goes with the formats that write files, like --format labels.";

@@ -22,7 +22,6 @@ enum class result_format {
     edl,
     fcpxml,
     reaper,
-    cue,  // inside the click track
 };
 
 struct options {

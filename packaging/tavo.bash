@@ -17,7 +17,7 @@ _tavo() {
     case $before in
         -m | --mode) mapfile -t COMPREPLY < <(compgen -W 'highlight beats both' -- "$word") ;;
         -f | --format) mapfile -t COMPREPLY < <(compgen -W 'text json csv labels kdenlive
-            losslesscut ffmetadata edl fcpxml reaper cue' -- "$word") ;;
+            losslesscut ffmetadata edl fcpxml reaper' -- "$word") ;;
         --fps) mapfile -t COMPREPLY < <(compgen -W '23.976 24 25 29.97 29.97df 30 50 59.94
             59.94df 60' -- "$word") ;;
         --shard) mapfile -t COMPREPLY < <(compgen -W 'auto' -- "$word") ;;

@@ -7,7 +7,7 @@ _arguments -s -S \
   '(-l --length)'{-l+,--length=}'[length of the highlight wanted]:seconds:' \
   '--max-beats=[maximum number of threshold-selected beats]:number:' \
   '(-j --jobs)'{-j+,--jobs=}'[files analysed at once]:number:' \
-  '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive losslesscut ffmetadata edl fcpxml reaper cue)' \
+  '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive losslesscut ffmetadata edl fcpxml reaper)' \
   '(-o --output-dir)'{-o+,--output-dir=}'[folder for the marker files]:folder:_files -/' \
   '--fps=[frames a second for edl and fcpxml]:rate:(23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60)' \
   '--force[overwrite files that exist]' \

@@ -10,7 +10,6 @@
 #include "cli/input/explain.h"
 #include "cli/input/short_path.h"
 #include "cli/write/click.h"
-#include "cli/write/markers.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
 
@@ -125,12 +124,7 @@ record analyse(const std::string &path, const options &opts, int stop_fd) {
     analyse_opened(opened, opts, stop_fd, out);
     out.cpu_ms = cpu_time_ms() - before_ms;
     close_short_path(opened);
-    std::string cue;
-    if (opts.format == result_format::cue) {
-        cue = cue_chunks(out);
-        out.written = opts.click;
-    }
-    const std::string error = finish_click(click, out.status == outcome::ok, cue);
+    const std::string error = finish_click(click, out.status == outcome::ok);
     if (!error.empty()) {
         out.status = outcome::failed;
         out.error = error;

@@ -31,20 +31,6 @@ bool is_whole_track(const std::string &path) {
     return info.st_size == static_cast<off_t>(kHeaderBytes) + static_cast<off_t>(data);
 }
 
-// Puts RIFF chunks behind the sound of a whole track.
-std::string append_chunks(output_file &file, const std::string &chunks) {
-    const off_t sound_end = lseek(file.fd, 0, SEEK_END);
-    std::string error = write_output(file, chunks);
-    if (!error.empty()) return error;
-    const auto riff_bytes = static_cast<uint32_t>(sound_end) + chunks.size() - 8;
-    std::string size;
-    for (int shift = 0; shift < 32; shift += 8) {
-        size += static_cast<char>(riff_bytes >> shift & 0xFF);
-    }
-    lseek(file.fd, 4, SEEK_SET);
-    return write_output(file, size);
-}
-
 }  // namespace
 
 std::string begin_click(click_file &click, const std::string &target, const std::string &input,
@@ -74,19 +60,15 @@ std::string begin_click(click_file &click, const std::string &target, const std:
     return error;
 }
 
-std::string finish_click(click_file &click, bool analysed, const std::string &chunks) {
+std::string finish_click(click_file &click, bool analysed) {
     fnamedec = "";
     if (!click.wanted || !click.direct.empty()) return "";
     if (!analysed) {
         abandon_output(click.file);
         return "";
     }
-    std::string error = "The click track " + shown(click.file.target) +
-                        " could not be written whole; the disk may be full.";
-    if (is_whole_track(click.file.temporary)) {
-        error = chunks.empty() ? "" : append_chunks(click.file, chunks);
-        if (error.empty()) return commit_output(click.file, click.force);
-    }
+    if (is_whole_track(click.file.temporary)) return commit_output(click.file, click.force);
     abandon_output(click.file);
-    return error;
+    return "The click track " + shown(click.file.target) +
+           " could not be written whole; the disk may be full.";
 }

@@ -20,8 +20,7 @@ struct click_file {
 std::string begin_click(click_file &click, const std::string &target, const std::string &input,
                         bool force);
 
-// After the job: gives a complete track its name, with the RIFF chunks appended, and removes an
-// incomplete one. Returns as above.
-std::string finish_click(click_file &click, bool analysed, const std::string &chunks);
+// After the job: gives a complete track its name and removes an incomplete one. Returns as above.
+std::string finish_click(click_file &click, bool analysed);
 
 #endif

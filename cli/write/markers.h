@@ -42,7 +42,4 @@ std::string ffmetadata_chapters(const record &result, const options &opts);
 std::string edl_markers(const record &result, const options &opts);
 std::string fcpxml_markers(const record &result, const options &opts);
 
-// Not a file: RIFF chunks for the end of the click track, with its cue points.
-std::string cue_chunks(const record &result);
-
 #endif

@@ -125,14 +125,3 @@ class Markers(Case):
                 self.assertAlmostEqual(start * rate, round(start * rate), delta=1e-6)  # a whole frame
                 found.append((start, start + length, marker.get("value")))
             self.assert_marks(found, [(a, max(b, a + 1 / rate), name) for a, b, name in marks], 1.001 / rate)
-
-    def test_cue_points(self):
-        for mode in ("beats", "both"):
-            path, marks = self.write("cue", f"--mode {mode} --length 12 -q", "--click c.wav")
-            self.assertEqual(path.name, "c.wav")
-            track = path.read_bytes()
-            self.assertEqual(int.from_bytes(track[4:8], "little"), len(track) - 8)
-            begin = marks[0][0] if mode == "both" else 0  # of the track
-            self.assert_marks([(c[0], c[2]) for c in chapters(path)], [(m[0] - begin, m[2]) for m in marks], 1 / 11025)
-            region = b"ltxt\x14\0\0\0\x01\0\0\0" + (12 * 11025).to_bytes(4, "little") + b"rgn "
-            self.assertEqual(region in track, mode == "both")

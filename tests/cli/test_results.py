@@ -18,7 +18,7 @@ USAGE = [
     ("-0 a.wav", "-0"), ("--output-dir . a.wav", "--format labels"), ("--skip-existing a.wav", "--format labels"),
     ("--skip-existing --force -f labels a.wav", "exclude each other"),
     ("--format labels --output-dir nowhere a.wav", "nowhere"), ("--fps 25 a.wav", "edl and fcpxml"),
-    ("--fps 26 -f edl a.wav", "--fps"), ("--format cue a.wav", "give both"),
+    ("--fps 26 -f edl a.wav", "--fps"),
     ("--click c.wav .", "--click takes exactly one"), ("--click c.wav --mode highlight a.wav", "needs beats"),
     ("--plot p.svg a.wav b.wav", "--plot takes exactly one"), ("--plot p.svg -", "--plot takes exactly one"),
     ("--plot p --click p a.wav", "name one file"), ("--embed a.wav", "--report"),
