@@ -354,7 +354,8 @@ std::optional<int> parse_options(int argc, char **argv, options &out) {
     }
     set_values(raw, out);
     std::string sentence = contradiction(out, raw);
-    if (sentence.empty() && !raw.shard.empty()) sentence = read_shard(raw.shard, out.share);
+    if (sentence.empty() && !raw.shard.empty())
+        sentence = read_shard(raw.shard, out.share).sentence;
     if (!sentence.empty()) return wrong_usage(sentence);
     write_notes(out);
     return std::nullopt;

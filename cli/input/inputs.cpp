@@ -5,7 +5,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <functional>
 
 #include "cli/input/recognise.h"
 #include "cli/write/file_names.h"
@@ -15,6 +14,8 @@
 
 namespace {
 
+constexpr size_t kStepsAtOnce = 64;  // files and folders looked at between two looks at the stop
+
 std::string joined(const std::string &folder, const std::string &name) {
     return folder.back() == '/' ? folder + name : folder + "/" + name;
 }
@@ -23,9 +24,8 @@ void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
 }
 
-uint64_t hash_of(uint64_t device, uint64_t inode, const std::string &name) {
-    return std::hash<std::string>()(std::to_string(device) + "/" + std::to_string(inode) + "/" +
-                                    name);
+file_id id_of(const struct stat &info) {
+    return {info.st_dev, info.st_ino};
 }
 
 // Claims the marker file of an input, so that no other input writes the same one. False leaves the
@@ -41,17 +41,17 @@ bool claim_target(input_supply &supply, input &entry) {
     if (stat((target.substr(0, target.size() - name.size()) + ".").c_str(), &info) != 0) {
         return true;  // writing will tell
     }
-    const uint64_t target_hash = hash_of(info.st_dev, info.st_ino, name);
+    const std::string key =
+        std::to_string(info.st_dev) + "/" + std::to_string(info.st_ino) + "/" + name;
     if (stat(entry.path.c_str(), &info) != 0) return true;
-    const uint64_t input_hash = hash_of(info.st_dev, info.st_ino, "");
-    const auto [claim, first] = supply.targets.emplace(target_hash, input_hash);
-    if (first) return true;
-    if (claim->second == input_hash) {
+    const auto [claim, is_first] = supply.targets.emplace(key, id_of(info));
+    if (is_first) return true;
+    if (claim->second == id_of(info)) {
         add_note(supply, shown(entry.path) + ": named more than once, done once.");
         return false;
     }
-    entry.error = "Its file " + shown(target) +
-                  " would replace that of another input, whose name is the same.";
+    entry.refusal = {"Its file " + shown(target) +
+                     " would replace that of another input, whose name is the same."};
     return true;
 }
 
@@ -70,24 +70,23 @@ int list_folder(open_folder &folder) {
     return code;
 }
 
-// Begins to search a folder, unless a link has led back to one that is being searched.
+// Begins to search a folder, unless this search has entered it before, through another link.
 // True when there is an input to hand out instead.
 bool enter_folder(input_supply &supply, const std::string &path, const struct stat &info,
                   input &out) {
+    if (supply.folders.empty()) {
+        supply.found = supply.skipped = 0;
+        supply.searched.clear();
+    }
+    if (!supply.searched.insert(id_of(info)).second) return false;
     open_folder folder;
     folder.path = path;
-    folder.id[0] = info.st_dev;
-    folder.id[1] = info.st_ino;
-    for (const open_folder &outer : supply.folders) {
-        if (std::equal(outer.id, outer.id + 2, folder.id)) return false;
-    }
     const int code = list_folder(folder);
     if (code != 0) {
-        out = {path, system_sentence("The folder cannot be read", code)};
+        out = {path, {system_sentence("The folder cannot be read", code)}};
         ++supply.found;
         return true;
     }
-    if (supply.folders.empty()) supply.found = supply.skipped = 0;
     supply.folders.push_back(std::move(folder));
     return false;
 }
@@ -98,10 +97,9 @@ bool leave_folder(input_supply &supply, input &out) {
     supply.folders.pop_back();
     if (!supply.folders.empty()) return false;
     if (supply.found == 0) {
-        out = {path, "The folder holds no audio files" +
-                         std::string(supply.opts.recursive
-                                         ? "."
-                                         : " itself; --recursive searches the folders in it.")};
+        const char *hint =
+            supply.opts.recursive ? "." : " itself; --recursive searches the folders in it.";
+        out = {path, {std::string("The folder holds no audio files") + hint}};
         return true;
     }
     if (supply.skipped > 0) {
@@ -130,7 +128,7 @@ bool take_entry(input_supply &supply, input &out) {
         return false;
     }
     ++supply.found;
-    out = {path, unreadable ? system_sentence("The file cannot be read", code) : ""};
+    out = {path, {unreadable ? system_sentence("The file cannot be read", code) : ""}};
     return true;
 }
 
@@ -139,15 +137,15 @@ bool take_path(input_supply &supply, const std::string &path, input &out) {
     if (stat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) {
         return enter_folder(supply, path, info, out);
     }
-    out = {path, ""};
+    out = {path, {}};
     return true;
 }
 
 // True for an input; waiting is set when the list has no more for now.
 bool take_from_list(input_supply &supply, input &out, bool &waiting) {
     std::string name;
-    std::string error;
-    const list_state state = next_name(supply.list, supply.opts.list_separator, name, error);
+    failure failed;
+    const list_state state = next_name(supply.list, supply.opts.list_separator, name, failed);
     if (state == list_state::name) return take_path(supply, name, out);
     waiting = state == list_state::waiting;
     if (waiting) return false;
@@ -155,7 +153,7 @@ bool take_from_list(input_supply &supply, input &out, bool &waiting) {
     if (state == list_state::ended && supply.list.names == 0) {
         add_note(supply, list_text(supply.list) + " names no files.");
     }
-    out = {supply.list.name, error};
+    out = {supply.list.name, failed};
     return state == list_state::failed;
 }
 
@@ -165,10 +163,8 @@ bool take_argument(input_supply &supply, input &out) {
     const bool listed = index >= opts.inputs.size();
     const std::string &word = listed ? opts.lists[index - opts.inputs.size()] : opts.inputs[index];
     if (!listed && word != "-") return take_path(supply, word, out);
-    const int code = open_list(supply.list, word);
-    if (code == 0) return false;
-    out = {word, system_sentence("The list of files cannot be read", code)};
-    return true;
+    out = {word, open_list(supply.list, word)};
+    return static_cast<bool>(out.refusal);
 }
 
 // True for an input.
@@ -187,9 +183,10 @@ bool is_done(const input_supply &supply) {
 
 supply_state next_input(input_supply &supply, input &out) {
     bool waiting = false;
-    while (!is_done(supply) && !waiting) {
+    for (size_t steps = 0; !is_done(supply) && !waiting; ++steps) {
+        if (steps == kStepsAtOnce) return supply_state::searching;
         if (!take_next(supply, out, waiting)) continue;
-        if (!out.error.empty() || !writes_files(supply.opts.format) || claim_target(supply, out)) {
+        if (out.refusal || !writes_files(supply.opts.format) || claim_target(supply, out)) {
             return supply_state::ready;
         }
     }

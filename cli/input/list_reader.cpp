@@ -26,29 +26,31 @@ bool is_readable(int fd) {
     return poll(&watched, 1, 0) > 0;
 }
 
-// Returns 0 or errno.
-int read_more(list_reader &list) {
+failure read_more(list_reader &list) {
     std::array<char, kReadBytes> part{};
     const ssize_t got = read(list.fd, part.data(), part.size());
-    if (got < 0) return errno == EINTR || errno == EAGAIN ? 0 : errno;
+    if (got < 0) {
+        if (errno == EINTR || errno == EAGAIN) return {};
+        return {system_sentence("The list of files cannot be read", errno)};
+    }
     list.ended = got == 0;
     list.text.append(part.data(), static_cast<size_t>(got));
-    return 0;
+    return {};
 }
 
 // A song given in the place of a list would make thousands of names.
-std::string explain_no_list(const list_reader &list, char separator) {
+failure check_list(const list_reader &list, char separator) {
     int32_t type = kMtsrcTypeUnknown;
     if (list.text.size() >= static_cast<size_t>(kHeadBytes)) recognise_bytes(list.text, type);
     if (type != kMtsrcTypeUnknown) {
         const std::string subject = list.name == "-" ? "Standard input" : "The list";
-        return subject + " holds sound (" + type_name(type) + "), not a list of names; " +
-               (list.name == "-" ? "save it to a file first." : "name it as FILE.");
+        return {subject + " holds sound (" + type_name(type) + "), not a list of names; " +
+                (list.name == "-" ? "save it to a file first." : "name it as FILE.")};
     }
     if (separator != '\0' && list.text.find('\0') != std::string::npos) {
-        return "The list holds NUL bytes: give -0 when its names end with them.";
+        return {"The list holds NUL bytes: give -0 when its names end with them."};
     }
-    return "";
+    return {};
 }
 
 bool is_comment(const std::string &line) {
@@ -68,19 +70,20 @@ bool take_line(list_reader &list, char separator, std::string &line) {
 
 }  // namespace
 
-int open_list(list_reader &list, const std::string &name) {
+failure open_list(list_reader &list, const std::string &name) {
     list = list_reader{};
     list.name = name;
     list.fd = name == "-" ? STDIN_FILENO : open(name.c_str(), O_RDONLY | O_CLOEXEC);
-    return list.fd < 0 ? errno : 0;
+    if (list.fd >= 0) return {};
+    return {system_sentence("The list of files cannot be read", errno)};
 }
 
-list_state next_name(list_reader &list, char separator, std::string &name, std::string &error) {
+list_state next_name(list_reader &list, char separator, std::string &name, failure &failed) {
     while (true) {
         if (!list.begun && !list.text.empty()) {
             list.begun = true;
-            error = explain_no_list(list, separator);
-            if (!error.empty()) return list_state::failed;
+            failed = check_list(list, separator);
+            if (failed) return list_state::failed;
             if (list.text.compare(0, 3, kByteOrderMark) == 0) list.text.erase(0, 3);
         }
         while (take_line(list, separator, name)) {
@@ -89,17 +92,14 @@ list_state next_name(list_reader &list, char separator, std::string &name, std::
             return list_state::name;
         }
         if (list.text.size() > kMostNameBytes) {
-            error = "The list holds a name of more than " + std::to_string(kMostNameBytes) +
-                    " bytes; is it a list of names?";
+            failed = {"The list holds a name of more than " + std::to_string(kMostNameBytes) +
+                      " bytes; is it a list of names?"};
             return list_state::failed;
         }
         if (list.ended) return list_state::ended;
         if (!is_readable(list.fd)) return list_state::waiting;
-        const int code = read_more(list);
-        if (code != 0) {
-            error = system_sentence("The list of files cannot be read", code);
-            return list_state::failed;
-        }
+        failed = read_more(list);
+        if (failed) return list_state::failed;
     }
 }
 

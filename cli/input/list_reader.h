@@ -4,6 +4,8 @@
 
 #include <string>
 
+#include "cli/failure.h"
+
 struct list_reader {
     std::string name;  // of the list, "-" for standard input
     int fd = -1;       // -1 when no list is being read
@@ -15,13 +17,12 @@ struct list_reader {
 
 enum class list_state { name, waiting, ended, failed };
 
-// Returns 0 or errno.
-int open_list(list_reader &list, const std::string &name);
+failure open_list(list_reader &list, const std::string &name);
 
 // Takes the next name: one that ends with the separator, or what stands before the list's end.
 // Lists with a newline per name may be M3U playlists: carriage returns at line ends and comments
-// are dropped. failed: error says why. Never waits.
-list_state next_name(list_reader &list, char separator, std::string &name, std::string &error);
+// are dropped. failed says why when the state is failed. Never waits.
+list_state next_name(list_reader &list, char separator, std::string &name, failure &failed);
 
 void close_list(list_reader &list);
 

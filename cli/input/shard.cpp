@@ -39,23 +39,25 @@ bool read_engine(shard &out) {
 
 }  // namespace
 
-std::string read_shard(const std::string &words, shard &out) {
+failure read_shard(const std::string &words, shard &out) {
     if (words == "auto") {
         if (!read_engine(out)) {
-            return "--shard auto finds no array in the environment (Slurm, Kubernetes with "
-                   "TAVO_SHARDS, AWS Batch).";
+            return {
+                "--shard auto finds no array in the environment (Slurm, Kubernetes with "
+                "TAVO_SHARDS, AWS Batch)."};
         }
     } else {
         const size_t slash = words.find('/');
         const char *text = words.data();
         if (slash == std::string::npos || !read_number(text, text + slash, out.index) ||
             !read_number(text + slash + 1, text + words.size(), out.count)) {
-            return "--shard takes I/N, as in 3/10, or auto.";
+            return {"--shard takes I/N, as in 3/10, or auto."};
         }
         --out.index;
     }
     const bool inside = out.count >= 1 && out.index >= 0 && out.index < out.count;
-    return inside ? "" : "--shard: the share must lie between 1 and the number of shares.";
+    if (inside) return {};
+    return {"--shard: the share must be from 1 to the number of shares."};
 }
 
 bool in_shard(const shard &of, const std::string &path) {

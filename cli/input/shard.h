@@ -5,6 +5,8 @@
 #include <cstdint>
 #include <string>
 
+#include "cli/failure.h"
+
 struct shard {
     int64_t index = 0;  // 0 to count - 1
     int64_t count = 1;
@@ -12,8 +14,8 @@ struct shard {
 
 // "I/N", I from 1 to N; or "auto": from the environment of a Slurm array (SLURM_ARRAY_TASK_*), a
 // Kubernetes indexed job (JOB_COMPLETION_INDEX) or an AWS Batch array (AWS_BATCH_JOB_ARRAY_*).
-// Where the engine does not tell N, TAVO_SHARDS does. Returns an empty string or a sentence.
-std::string read_shard(const std::string &words, shard &out);
+// Where the engine does not tell N, TAVO_SHARDS does.
+failure read_shard(const std::string &words, shard &out);
 
 // Whether the file belongs to the share: by a hash of the path's bytes that is the same everywhere.
 bool in_shard(const shard &of, const std::string &path);

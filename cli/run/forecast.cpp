@@ -73,12 +73,11 @@ void add_file(catalogue &all, const std::string &path, size_t most) {
 // Returns an empty string or a sentence.
 std::string read_catalogue(const options &opts, catalogue &all) {
     list_reader list;
-    const int code = open_list(list, opts.forecast);
-    if (code != 0) return system_sentence("The list of files cannot be read", code);
+    failure failed = open_list(list, opts.forecast);
+    if (failed) return failed.sentence;
     std::string name;
-    std::string error;
     while (!stop_requested()) {
-        const list_state state = next_name(list, opts.list_separator, name, error);
+        const list_state state = next_name(list, opts.list_separator, name, failed);
         if (state == list_state::name) add_file(all, name, static_cast<size_t>(opts.sample));
         if (state == list_state::ended || state == list_state::failed) break;
         if (state != list_state::waiting) continue;
@@ -86,7 +85,7 @@ std::string read_catalogue(const options &opts, catalogue &all) {
         poll(watched, 2, -1);
     }
     close_list(list);
-    if (!error.empty()) return error;
+    if (failed) return failed.sentence;
     return all.files > 0 ? "" : "The list names no files that are there.";
 }
 

@@ -128,7 +128,7 @@ supply_state find_next(worker_pool &pool, numbered_input &next) {
 // Whether the input is this command's to analyse, and is not stored yet.
 bool is_wanted(worker_pool &pool, numbered_input &next) {
     if (!in_shard(pool.opts.share, next.entry.path)) return false;
-    if (pool.opts.from_store || !next.entry.error.empty()) return true;
+    if (pool.opts.from_store || next.entry.refusal) return true;
     std::string message;
     const bool wanted = wants_song(pool.keeper, pool.opts, next.entry.path, next.file, message);
     write_message(pool.output, message);
@@ -140,11 +140,8 @@ void search_inputs(worker_pool &pool) {
     for (size_t i = 0; i < kFoundAtOnce && may_search(pool); ++i) {
         numbered_input next;
         pool.found = find_next(pool, next);
-        if (pool.found == supply_state::waiting) break;
-        if (pool.found == supply_state::ended) {
-            set_total(pool.output, pool.count);
-            break;
-        }
+        if (pool.found == supply_state::ended) set_total(pool.output, pool.count);
+        if (pool.found != supply_state::ready) break;
         if (!is_wanted(pool, next)) continue;
         next.index = pool.count++;
         pool.queue.push_back(std::move(next));
@@ -175,8 +172,8 @@ void hand_out(worker_pool &pool) {
     while (!pool.ending && !pool.queue.empty()) {
         const numbered_input &first = pool.queue.front();
         if (first.index >= pool.output.next + kMostWaiting) return;
-        if (!first.entry.error.empty()) {
-            fail_input(pool, first, first.entry.error);
+        if (first.entry.refusal) {
+            fail_input(pool, first, first.entry.refusal.sentence);
             pool.queue.pop_front();
             continue;
         }

@@ -1,10 +1,12 @@
 #include "cli/write/file_names.h"
 
+#include <algorithm>
 #include <array>
 #include <climits>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
+#include <iterator>
 
 namespace {
 
@@ -38,9 +40,23 @@ void add_hex(std::string &out, const char *before, uint8_t byte) {
     out += kHex[byte & 15];
 }
 
-// The control characters of C1, two bytes in UTF-8: terminals obey them.
-bool is_c1_control(const std::string &bytes, size_t i) {
-    return byte_at(bytes, i) == 0xC2 && byte_at(bytes, i + 1) < 0xA0;
+uint32_t code_point(const std::string &bytes, size_t i, size_t length) {
+    uint32_t point = byte_at(bytes, i) & (length == 1 ? 0x7Fu : 0xFFu >> (length + 1));
+    for (size_t k = 1; k < length; ++k) point = point << 6 | (byte_at(bytes, i + k) & 0x3Fu);
+    return point;
+}
+
+// Characters that move the cursor or reorder the text of a terminal: control characters, line
+// separators, and marks of the writing direction.
+bool is_control(uint32_t point) {
+    struct range {
+        uint32_t first, last;
+    };
+    constexpr range kControls[] = {{0, 0x1F},        {0x7F, 0x9F},     {0x61C, 0x61C},
+                                   {0x200E, 0x200F}, {0x2028, 0x202E}, {0x2066, 0x2069}};
+    return std::any_of(std::begin(kControls), std::end(kControls), [=](const range &controls) {
+        return point >= controls.first && point <= controls.last;
+    });
 }
 
 // FNV-1a
@@ -72,15 +88,30 @@ std::string shown(const std::string &bytes) {
             out += "\\t";
         } else if (byte == '\\') {
             out += "\\\\";
-        } else if (length == 0 || byte < 0x20 || byte == 0x7F) {
-            add_hex(out, "\\x", byte);
-        } else if (is_c1_control(bytes, i)) {
-            add_hex(out, "\\x", byte);
-            add_hex(out, "\\x", byte_at(bytes, i + 1));
+        } else if (length == 0 || is_control(code_point(bytes, i, length))) {
+            for (size_t k = 0; k < std::max<size_t>(length, 1); ++k) {
+                add_hex(out, "\\x", byte_at(bytes, i + k));
+            }
         } else {
             out.append(bytes, i, length);
         }
         i += length == 0 ? 1 : length;
+    }
+    return out;
+}
+
+std::string json_text(const std::string &utf8) {
+    std::string out;
+    for (size_t i = 0; i < utf8.size();) {
+        const size_t length = std::max<size_t>(character_length(utf8, i), 1);
+        const uint32_t point = code_point(utf8, i, length);
+        if (is_control(point)) {
+            add_hex(out, "\\u", static_cast<uint8_t>(point >> 8));
+            add_hex(out, "", static_cast<uint8_t>(point & 0xFF));
+        } else {
+            out.append(utf8, i, length);
+        }
+        i += length;
     }
     return out;
 }

@@ -6,9 +6,12 @@
 
 bool is_utf8(const std::string &bytes);
 
-// One line, whatever the bytes: control characters as \n, \t or \xNN, a backslash doubled, bytes
-// that are not UTF-8 as \xNN.
+// One line, whatever the bytes: control characters, line separators and marks of the writing
+// direction as \n, \t or \xNN, a backslash doubled, bytes that are not UTF-8 as \xNN.
 std::string shown(const std::string &bytes);
+
+// JSON without line breaks, with the same characters as \uNNNN: it means the same to a program.
+std::string json_text(const std::string &utf8);
 
 // Valid UTF-8: each byte that is not part of a character becomes U+FFFD.
 std::string as_utf8(const std::string &bytes);

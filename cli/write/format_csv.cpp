@@ -1,12 +1,17 @@
+#include <unistd.h>
+
 #include <cmath>
 
+#include "cli/write/file_names.h"
 #include "cli/write/format.h"
 #include "cli/write/value_text.h"
 
 namespace {
 
-// Quoted where the cell needs it. Names go out byte for byte, whatever their encoding.
-std::string cell(const std::string &value) {
+// Quoted where the cell needs it. Names go out byte for byte, whatever their encoding, except to a
+// terminal. Programs read this format: a name that begins with = + - @ stays as it is.
+std::string cell(const std::string &text) {
+    const std::string value = isatty(STDOUT_FILENO) == 1 ? shown(text) : text;
     if (value.find_first_of(",\"\r\n") == std::string::npos) return value;
     std::string out = "\"";
     for (const char c : value) {

@@ -32,7 +32,7 @@ std::string json_record(const record &result) {
     }
     if (result.cpu_ms >= 0) object["cpu_ms"] = result.cpu_ms;
     if (!result.error.empty()) object["error"] = as_utf8(result.error);
-    return object.dump() + "\n";
+    return json_text(object.dump()) + "\n";
 }
 
 record record_from_json(const std::string &text) {

@@ -12,7 +12,7 @@ from command_case import Case, send
 ODD_NAMES = [
     b"two words.wav", b"line\nbreak.wav", b"tab\tand \"quotes\", comma.wav", b"caf\xc3\xa9.wav",
     b"caf\xe9.wav",  # Latin-1
-    b"\xed\xa0\x80 surrogate.wav", b"[a,b]", b"fd", b"back\\slash.wav", b"esc\x1b[31m\xc2\x9b31mred.wav",
+    b"\xed\xa0\x80 surrogate.wav", b"[a,b]", b"fd", b"back\\slash.wav", b"esc\x1b[31m\xc2\x9b31m\xe2\x80\xaered.wav",
 ]
 
 
@@ -39,6 +39,8 @@ class Inputs(Case):
         self.assertEqual(results[4]["file"], "caf\ufffd.wav")
         self.assertEqual([r["file"] for r in results if "file_bytes" not in r],
                          [name.decode() for name in ODD_NAMES[:4] + ODD_NAMES[6:]])
+        text = self.run_tavo("--mode", "highlight", "--format", "json", ODD_NAMES[-1]).stdout
+        self.assertIn(rb"esc\u001b[31m\u009B31m\u202Ered.wav", text)
         text = self.run_tavo("--mode", "highlight", "--format", "csv", *ODD_NAMES).stdout
         rows = csv.DictReader(io.StringIO(os.fsdecode(text), newline=""), strict=True)
         self.assertEqual([os.fsencode(row["file"]) for row in rows], ODD_NAMES)
@@ -54,7 +56,7 @@ class Inputs(Case):
         lines = done.stdout.decode("utf-8").split("\n")
         self.assertEqual(len(lines), 3 * len(ODD_NAMES) + 1)
         self.assertIn(r"line\nbreak.wav", lines)
-        self.assertIn(r"esc\x1B[31m\xC2\x9B31mred.wav", lines)
+        self.assertIn(r"esc\x1B[31m\xC2\x9B31m\xE2\x80\xAEred.wav", lines)
 
     def test_folders(self):
         self.assertEqual(self.found("music"), [b"music/a.wav", b"music/b.txt", b"music/link.wav"])
@@ -64,7 +66,10 @@ class Inputs(Case):
         self.assertEqual(self.found("-r", "-j", "2", "music/"), everything)
         self.assertEqual(self.run_tavo("-m", "highlight", "music").stderr,
                          b"tavo: music: 2 files left out, not recognised as audio.\n")
-        (self.folder / "none/of/them").mkdir(parents=True)
+        for depth in range(24):  # 2 to the 24 ways to the innermost folder
+            for way in "ab":
+                (self.folder / f"none/{depth}").mkdir(parents=True, exist_ok=True)
+                (self.folder / f"none/{depth}/{way}").symlink_to(f"../{depth + 1}")
         for words in ("none", "--recursive none"):
             self.run_tavo(*words.split(), status=1, said=b"none: The folder holds no audio files")
 
