@@ -1,131 +1,138 @@
 #include "cli/input/explain.h"
 
-#include <fcntl.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdio>
 
+#include "cli/input/file_bytes.h"
 #include "cli/input/recognise.h"
-#include "cli/input/wav_header.h"
 #include "cli/write/value_text.h"
-#include "common/limits.h"
-#include "media_source/mtsrc.h"
+#include "include/tavo.h"
 
 namespace {
 
 constexpr const char *kConvert = " ffmpeg -i FILE -ar 44100 NEW.flac converts it.";
+constexpr int64_t kMsPerMinute = 60'000;
 
-std::string rates_text() {
-    return std::to_string(kMinRate) + " to " + std::to_string(kMaxRate) + " Hz";
-}
-
-std::string seconds_text(int64_t units) {
-    const int64_t ms = units / kUnitsPerMs;
+std::string seconds_text(int64_t ms) {
     std::array<char, 32> text{};
     snprintf(text.data(), text.size(), "%lld.%03lld", static_cast<long long>(ms / 1000),
              static_cast<long long>(ms % 1000));
     return text.data();
 }
 
-// The source opened, so one of the pipeline's own limits is broken or its segments could not be
-// prepared.
-std::string explain_stream(const mtsrc_format &format) {
-    if (format.duration <= kRefusedUnits) {
-        return "The audio is too short: it lasts " + seconds_text(format.duration) +
-               " s and must last more than " + std::to_string(kRefusedUnits / kUnitsPerSecond) +
-               " s.";
+// Reads the start and the end of the file, where its format is described, to find a read error that
+// the library's code does not name. Returns errno or 0.
+int find_read_error(const std::string &path) {
+    constexpr int64_t kBlockBytes = 1 << 20;
+    constexpr int64_t kBlocks = 64;  // at each end
+    file_bytes file;
+    if (!open_bytes(file, path)) return errno;
+    const int64_t end_blocks = std::max(file.size - kBlocks * kBlockBytes, kBlocks * kBlockBytes);
+    for (const int64_t start : {int64_t{0}, end_blocks}) {
+        for (int64_t i = 0; i < kBlocks && file.error == 0; ++i) {
+            if (read_bytes(file, start + i * kBlockBytes, kBlockBytes).empty()) break;
+        }
     }
-    if (format.sample_rate < kMinRate) {
-        return "The sample rate is too low: it is " + std::to_string(format.sample_rate) +
-               " Hz and must be at least " + std::to_string(kMinRate) + " Hz." + kConvert;
-    }
-    return "The file could not be prepared for decoding; there may be too little memory for audio "
-           "of " +
-           seconds_text(format.duration) + " s.";
+    close_bytes(file);
+    return file.error;
 }
 
-std::string explain_refused_format(const std::string &path, int32_t type) {
-    if (type == kMtsrcTypeWav) return explain_wav(path);
-    if (type == kMtsrcTypeMp4) {
-        return "The MP4 file's audio is neither AAC nor MP3, or its sample rate is not within " +
-               rates_text() + "." + kConvert;
+std::string explain_format(file_kind kind) {
+    const std::string name = kind_name(kind);
+    const std::string rates =
+        std::to_string(TAVO_MIN_RATE) + " to " + std::to_string(TAVO_MAX_RATE) + " Hz";
+    switch (kind) {
+        case file_kind::unknown:
+            return "The file is not recognised as audio of a known format.";
+        case file_kind::wav:
+            return "The WAV file is damaged or is not 16-bit integer PCM at up to " +
+                   std::to_string(TAVO_MAX_RATE) + " Hz, which is all that is read." + kConvert;
+        case file_kind::mp4:
+            return "The MP4 file's audio is neither AAC nor MP3, or its sample rate is not " +
+                   rates + "." + kConvert;
+        case file_kind::asf:
+        case file_kind::aiff:
+        case file_kind::matroska:
+            return "The file is " + name + ", a format that is not read." + kConvert;
+        default:
+            return "The " + name + " file has a sample rate that is not read; " + rates + " are." +
+                   kConvert;
     }
-    return std::string("The ") + type_name(type) + " file has a sample rate that is not read; " +
-           rates_text() + " are." + kConvert;
 }
 
-std::string explain_source_code(const std::string &path, int32_t type, int32_t code) {
-    const std::string subject = std::string("The ") + type_name(type) + " file ";
+// The reason for a code of tavo_probe.
+std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream) {
+    const std::string subject = std::string("The ") + kind_name(kind) + " file ";
     switch (code) {
+        case TAVO_OK:
+            return "The file could not be read when its decoding was prepared.";
         case TAVO_ERR_MEMORY:
             return "There is not enough memory to open the file.";
         case TAVO_ERR_FORMAT:
-            return explain_refused_format(path, type);
+            return explain_format(kind);
         case TAVO_ERR_OPEN:
-            if (type == kMtsrcTypeOgg) {
-                return "The Ogg file has no usable audio stream; only Vorbis is read from Ogg." +
-                       std::string(kConvert);
-            }
-            return subject + "has no usable audio stream.";
+            if (kind != file_kind::ogg) return subject + "has no usable audio stream.";
+            return "The Ogg file has no usable audio stream; only Vorbis is read from Ogg." +
+                   std::string(kConvert);
         case TAVO_ERR_READ:
             return subject + "cannot be read or decoded.";
         case TAVO_ERR_CODEC:
-            return subject +
-                   "cannot be decoded: the codec library failed or has no decoder for it.";
+            return subject + "cannot be decoded: no decoder accepts its audio.";
+        case TAVO_ERR_SHORT:
+            return "The audio is too short: it lasts " + seconds_text(stream.duration_ms) +
+                   " s and must last more than 1 s.";
+        case TAVO_ERR_LOW_RATE:
+            return "The sample rate is too low: it is " + std::to_string(stream.rate) +
+                   " Hz and must be at least " + std::to_string(TAVO_MIN_RATE) + " Hz." + kConvert;
         default:
-            return subject + "cannot be used (code " + std::to_string(code) + ").";
+            return subject + "cannot be used: " + tavo_error_text(code) + ".";
     }
 }
 
 }  // namespace
 
-std::string explain_before_open(const std::string &path) {
+failure check_file(const std::string &path) {
     struct stat info {};
     if (stat(path.c_str(), &info) != 0) {
-        if (errno == ENOENT) return "The file does not exist.";
-        return system_sentence("The file cannot be opened", errno);
+        if (errno == ENOENT) return {"The file does not exist."};
+        return {system_sentence("The file cannot be opened", errno)};
     }
-    if (S_ISDIR(info.st_mode)) return "This is a folder, not a file.";
-    if (!S_ISREG(info.st_mode)) return "This is a device, pipe or socket, not a file.";
-    const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
-    if (fd < 0) return system_sentence("The file cannot be read", errno);
-    char byte = 0;
-    const ssize_t got = read(fd, &byte, 1);
-    const int code = errno;
-    close(fd);
-    if (got < 0) return system_sentence("The file cannot be read", code);
-    if (got == 0) return "The file is empty.";
-    if (info.st_size < kHeadBytes) {
-        return "The file is too short to be audio: it has " + std::to_string(info.st_size) +
-               " bytes.";
-    }
-    return "";
+    if (S_ISDIR(info.st_mode)) return {"This is a folder, not a file."};
+    if (!S_ISREG(info.st_mode)) return {"This is a device, pipe or socket, not a file."};
+    file_bytes file;
+    if (!open_bytes(file, path)) return {system_sentence("The file cannot be read", errno)};
+    const std::string head = read_bytes(file, 0, TAVO_MIN_FILE_BYTES);
+    close_bytes(file);
+    if (file.error != 0) return {system_sentence("The file cannot be read", file.error)};
+    if (head.empty()) return {"The file is empty."};
+    if (head.size() == TAVO_MIN_FILE_BYTES) return {};
+    return {"The file is too short to be audio: it has " + std::to_string(head.size()) + " bytes."};
 }
 
-std::string explain_unusable(const std::string &path, int32_t code, record &result) {
-    if (code == TAVO_ERR_MEMORY) return "There is not enough memory to analyse the file.";
-    int32_t type = kMtsrcTypeUnknown;
-    const int recognised = recognise(path, type);
-    if (recognised > 0) return system_sentence("The file cannot be read", recognised);
-    if (recognised < 0) return "The file cannot be read far enough to recognise its format.";
-    if (type == kMtsrcTypeUnknown) return "The file is not recognised as audio of a known format.";
-    if (type == kMtsrcTypeAsf) {
-        return std::string("The file is ") + type_name(type) + ", a format that is refused." +
-               kConvert;
+failure explain_refusal(const std::string &path, int32_t code, record &result) {
+    if (code == TAVO_ERR_MEMORY) return {"There is not enough memory to analyse the file."};
+    TAVO_STREAM stream{};
+    code = tavo_probe(path.c_str(), &stream);
+    result.has_stream = stream.rate > 0;
+    result.sample_rate = stream.rate;
+    result.channels = stream.channels;
+    result.duration_ms = stream.duration_ms;
+    file_kind kind = file_kind::unknown;
+    int read_error = recognise(path, kind);
+    if (read_error == 0 && code != TAVO_ERR_FORMAT && !result.has_stream) {
+        read_error = find_read_error(path);
     }
-    const mtsrc_param param{path.c_str()};
-    int32_t error = 0;
-    mtsrc_ctx *source = mtsrc_init(&param, &error);
-    if (source == nullptr) return explain_source_code(path, type, error);
-    mtsrc_format format{};
-    mtsrc_getstream_format(source, &format);
-    mtsrc_deinit(source);
-    result.has_stream = true;
-    result.sample_rate = format.sample_rate;
-    result.channels = format.channels;
-    result.duration_ms = format.duration / kUnitsPerMs;
-    return explain_stream(format);
+    if (read_error != 0) return {system_sentence("The file cannot be read", read_error)};
+    return {explain_code(kind, code, stream)};
+}
+
+failure check_duration(int64_t duration_ms, int32_t max_minutes) {
+    if (duration_ms <= max_minutes * kMsPerMinute) return {};
+    return {"The audio lasts " + whole_clock_text(static_cast<double>(duration_ms)) +
+            " by what the file states; --max-minutes allows " + std::to_string(max_minutes) +
+            " minutes."};
 }

@@ -7,10 +7,11 @@
 #include <cerrno>
 
 #include "cli/input/recognise.h"
+#include "cli/input/short_path.h"
 #include "cli/write/file_names.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"
-#include "media_source/mtsrc.h"
+#include "include/tavo.h"
 
 namespace {
 
@@ -109,6 +110,19 @@ bool leave_folder(input_supply &supply, input &out) {
     return false;
 }
 
+// Whether the file is to be analysed or reported; code receives errno when it cannot be read.
+bool is_audio(const std::string &path, int &code) {
+    file_kind kind = file_kind::unknown;
+    code = recognise(path, kind);
+    if (code != 0) return code == EACCES || code == EPERM || code == EIO;
+    if (kind != file_kind::unknown) return true;
+    // The library finds MPEG audio also after other bytes.
+    short_path opened = open_short_path(path);
+    const int32_t probed = tavo_probe(opened.path.c_str(), nullptr);
+    close_short_path(opened);
+    return probed != TAVO_ERR_FORMAT && probed != TAVO_ERR_READ;
+}
+
 bool take_entry(input_supply &supply, input &out) {
     open_folder &folder = supply.folders.back();
     if (folder.next == folder.names.size()) return leave_folder(supply, out);
@@ -119,16 +133,13 @@ bool take_entry(input_supply &supply, input &out) {
         return supply.opts.recursive && enter_folder(supply, path, info, out);
     }
     if (!S_ISREG(info.st_mode)) return false;
-    int32_t type = kMtsrcTypeUnknown;
-    const int code = recognise(path, type);
-    const bool unreadable = code == EACCES || code == EPERM || code == EIO;
-    const bool audio = code == 0 && type != kMtsrcTypeUnknown;
-    if (!unreadable && !audio) {
+    int code = 0;
+    if (!is_audio(path, code)) {
         ++supply.skipped;
         return false;
     }
     ++supply.found;
-    out = {path, {unreadable ? system_sentence("The file cannot be read", code) : ""}};
+    out = {path, {code != 0 ? system_sentence("The file cannot be read", code) : ""}};
     return true;
 }
 

@@ -12,8 +12,6 @@
 #include "cli/input/recognise.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
-#include "common/limits.h"
-#include "media_source/mtsrc.h"
 
 namespace {
 
@@ -40,11 +38,10 @@ failure read_more(list_reader &list) {
 
 // A song given in the place of a list would make thousands of names.
 failure check_list(const list_reader &list, char separator) {
-    int32_t type = kMtsrcTypeUnknown;
-    if (list.text.size() >= static_cast<size_t>(kHeadBytes)) recognise_bytes(list.text, type);
-    if (type != kMtsrcTypeUnknown) {
+    const file_kind kind = recognise_bytes(list.text);
+    if (kind != file_kind::unknown) {
         const std::string subject = list.name == "-" ? "Standard input" : "The list";
-        return {subject + " holds sound (" + type_name(type) + "), not a list of names; " +
+        return {subject + " holds sound (" + kind_name(kind) + "), not a list of names; " +
                 (list.name == "-" ? "save it to a file first." : "name it as FILE.")};
     }
     if (separator != '\0' && list.text.find('\0') != std::string::npos) {

@@ -1,19 +1,33 @@
-// What a file contains, by its content rather than by its name.
+// What a file contains, by its first bytes rather than by its name. The library decides what can be
+// analysed; this tells audio from other files without opening it, and names it for people.
 #ifndef TAVO_CLI_INPUT_RECOGNISE_H
 #define TAVO_CLI_INPUT_RECOGNISE_H
 
-#include <cstdint>
 #include <string>
 
-// Returns 0 with the type code of media_source/mtsrc.h, an errno value when the file cannot be
-// opened or read, -1 when it is not a regular file or is shorter than recognition needs. Never
-// blocks, whatever kind of file it is.
-int recognise(const std::string &path, int32_t &type);
+enum class file_kind {
+    unknown,
+    wav,
+    aiff,
+    flac,
+    ogg,
+    mp4,
+    aac,
+    mpeg,  // Layers I to III, "MP3"
+    asf,
+    matroska,
+};
 
-// The same for bytes from the start of a file.
-int recognise_bytes(const std::string &bytes, int32_t &type);
+constexpr size_t kKindBytes = 16;  // that recognise_bytes looks at
+
+// head: the first bytes of a file, or those after its ID3v2 tag.
+file_kind recognise_bytes(const std::string &head);
+
+// Returns 0, or errno when the file cannot be opened or read. Anything but a regular file is
+// unknown. Never blocks.
+int recognise(const std::string &path, file_kind &kind);
 
 // The format's name for people.
-const char *type_name(int32_t type);
+const char *kind_name(file_kind kind);
 
 #endif

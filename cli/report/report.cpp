@@ -140,8 +140,8 @@ std::string find_sound(const std::string &song_path, const std::string &page_pat
     const fs::path song = fs::weakly_canonical(fs::absolute(song_path), failed);
     const fs::path relative = song.lexically_relative(folder);
     sound.link = percent_encoded((relative.empty() ? song : relative).string());
-    int32_t type = kMtsrcTypeUnknown;
-    if (recognise(song_path, type) == 0 && type == kMtsrcTypeAac) {
+    file_kind kind = file_kind::unknown;
+    if (recognise(song_path, kind) == 0 && kind == file_kind::aac) {
         sound.note =
             "Browsers misjudge the length of bare AAC files, so that times may be off. A page made "
             "with --embed is exact.";
@@ -218,8 +218,8 @@ std::string report_page_path(const options &opts, uint64_t index, const std::str
 }
 
 std::string check_report(const std::string &target, bool force) {
-    int32_t type = kMtsrcTypeUnknown;
-    if (recognise(target, type) == 0 && type != kMtsrcTypeUnknown) {
+    file_kind kind = file_kind::unknown;
+    if (recognise(target, kind) == 0 && kind != file_kind::unknown) {
         return "The page " + shown(target) + " would replace a song.";
     }
     return check_target(target, force);

@@ -94,7 +94,7 @@ void analyse_opened(const short_path &opened, const options &opts, int stop_fd, 
     int32_t code = TAVO_OK;
     TAVO_CTX *ctx = tavo_init(&param, &code);
     if (ctx == nullptr) {
-        out.error = explain_unusable(opened.path, code, out);
+        out.error = explain_refusal(opened.path, code, out).sentence;
         return;
     }
     run_job(ctx, opts, stop_fd, out);
@@ -111,7 +111,7 @@ int64_t cpu_time_ms() {
 }  // namespace
 
 record analyse(const std::string &path, const options &opts, int stop_fd) {
-    record out = failed_record(path, opts.mode, explain_before_open(path));
+    record out = failed_record(path, opts.mode, check_file(path).sentence);
     out.length_s = opts.length_s;
     if (!out.error.empty()) return out;
 
