@@ -65,27 +65,29 @@ void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float *
 }
 
 void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
-    prepare_beat_ctx(ctx, beat);
-    const int64_t n = analysis_length(ctx);
-    beat->signal = zeroed_items<double>(n);
-    beat->rise_flags = zeroed_items<int32_t>(n);
-    if (beat->signal != nullptr) scale_samples({ctx->ana, kFullScale}, n, beat->signal);
+    init_beat_ctx(ctx, true, beat);
 }
 
-bool prepare_beat_ctx(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
+bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat) {
     worker_lock_create(&feat_mutex_mt, &feat_cond_mt);
 
+    const int64_t n = analysis_length(ctx);
     const int32_t frame_size = ctx->onset->frame_size;
     const int32_t hop_size = ctx->onset->hop_size;
     beat->band_count = kMelBands;
     beat->hop_seconds = static_cast<double>(hop_size) / ctx->ana_rate;
     beat->half_frame = frame_size > 0 ? frame_size / 2 : 0;
-    beat->frame_count = count_frames(analysis_length(ctx), frame_size, hop_size);
+    beat->frame_count = count_frames(n, frame_size, hop_size);
 
     beat->frame_times = zeroed_items<float>(beat->frame_count);
     beat->onset_env = zeroed_items<double>(beat->frame_count);
     beat->mel_matrix = alloc_rows(beat->half_frame, kMelBands);
     beat->threshold = zeroed_items<double>(beat->frame_count);
+    if (with_signal) {
+        beat->signal = zeroed_items<double>(n);
+        beat->rise_flags = zeroed_items<int32_t>(n);
+    }
+    if (beat->signal != nullptr) scale_samples({ctx->ana, kFullScale}, n, beat->signal);
     const bool ready = feat_mutex_mt != nullptr && feat_cond_mt != nullptr &&
                        beat->frame_times != nullptr && beat->onset_env != nullptr &&
                        beat->threshold != nullptr && beat->mel_matrix != nullptr &&

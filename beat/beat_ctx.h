@@ -63,9 +63,9 @@ void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float *
 // to[count] = the view's samples over its full scale.
 void scale_samples(sample_view view, int64_t count, double *to);
 
-// __beat_init without signal and rise_flags: for an analysis that reads ana itself. False when
-// memory runs out.
-bool prepare_beat_ctx(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
+// The body of __beat_init. A job, which reads ana itself, sets with_signal to false: signal and
+// rise_flags, 12 bytes a sample, then stay null. Returns false if memory ran out for the rest.
+bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat);
 
 // Samples of the analysis signal, 0 when there is none.
 inline int64_t analysis_length(const TAVO_CTX *ctx) {

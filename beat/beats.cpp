@@ -50,7 +50,7 @@ outcome take_onsets_and_rises(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     const TAVO_ONSET_CTX *onset = ctx->onset;
     rise_search search = {ctx, 0, nullptr};
     const side_work beside = {search_rises, &search};
-    fill_onset_envelope(beat, view_of(ctx), onset->frame_size, onset->hop_size, &beside);
+    compute_onset_envelope(beat, view_of(ctx), onset->frame_size, onset->hop_size, &beside);
     const outcome end = keep_rises(&search, onset->hop_size, beat);
     free(search.samples);
     return end;
@@ -65,7 +65,7 @@ outcome find_tempo(TAVO_ONSET_CTX *onset, const TAVO_BEAT_CTX *beat) {
 
 // Leaves the beats in an array of their exact number; none at all leave it null.
 outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
-    auto *room = zeroed_items<float>(candidate_room(beat));
+    auto *room = zeroed_items<float>(candidate_capacity(beat));
     if (room == nullptr) return out_of_memory;
     const int32_t count = getBeatCandi_MT(beat, onset, room);
     outcome end = going_on;
@@ -107,7 +107,7 @@ int32_t getBeatPosition(TAVO_CTX *ctx) {
     auto *beat = zeroed_items<TAVO_BEAT_CTX>(1);
     if (beat == nullptr) return 0;
 
-    if (prepare_beat_ctx(ctx, beat) && analyse(ctx, beat) == going_on) {
+    if (init_beat_ctx(ctx, false, beat) && analyse(ctx, beat) == going_on) {
         store_flag(&ctx->state, kStateFinished);
     }
     __tavo_deinit(beat);

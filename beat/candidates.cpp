@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "beat/gap_fill.h"
 #include "beat/threshold.h"
 #include "dsp/peaks.h"
 
@@ -52,9 +53,12 @@ int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const do
 // thr: [F - 1] zero before; peaks: zero before.
 int32_t place_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *thr, PEAK_LIST *peaks,
                     float *out) {
-    const int64_t count = beat->frame_count - 1;
-    const placement place = place_for(onset->bpm, beat->frame_times[0]);
-    if (build_threshold(beat, place.window, thr) != 0) return 0;
+    const int64_t count = beat->frame_count > 1 ? beat->frame_count - 1 : 0;
+    const float hop =
+        beat->frame_count > 0 ? beat->frame_times[0] : static_cast<float>(beat->hop_seconds);
+    if (!(hop > 0.0f)) return 0;
+    const placement place = place_for(onset->bpm, hop);
+    if (build_threshold(beat, place.window, hop, thr) != 0) return 0;
     const int32_t found = findPeaksPriority(beat->onset_env, count, place.distance, peaks->frames,
                                             beat->rise_frames, beat->rise_count);
     peaks->count = found > 0 ? found : 0;
@@ -72,20 +76,20 @@ int32_t place_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *th
 }
 
 // No two peaks are neighbours.
-int64_t peak_room(const TAVO_BEAT_CTX *beat) {
+int64_t peak_capacity(const TAVO_BEAT_CTX *beat) {
     return (beat->frame_count > 0 ? beat->frame_count / 2 : 0) + beat->rise_count;
 }
 
 }  // namespace
 
-int64_t candidate_room(const TAVO_BEAT_CTX *beat) {
-    return peak_room(beat) + kMaxAddedBeats;
+int64_t candidate_capacity(const TAVO_BEAT_CTX *beat) {
+    return peak_capacity(beat) + kMaxAddedBeats;
 }
 
 int32_t getBeatCandi_MT(TAVO_BEAT_CTX *beat, TAVO_ONSET_CTX *onset, float *out) {
-    if (beat->frame_count < 2 || onset->bpm < 1 || onset->bpm > kBeatPerFrame) return 0;
+    if (onset->bpm < 1 || onset->bpm > kBeatPerFrame) return 0;
     auto *thr = zeroed_items<double>(beat->frame_count - 1);
-    PEAK_LIST peaks = {zeroed_items<int32_t>(peak_room(beat)), 0};
+    PEAK_LIST peaks = {zeroed_items<int32_t>(peak_capacity(beat)), 0};
     int32_t total = 0;
     if (thr != nullptr && peaks.frames != nullptr) {
         total = place_beats(beat, onset, thr, &peaks, out);

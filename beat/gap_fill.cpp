@@ -1,4 +1,4 @@
-#include "beat/candidates.h"
+#include "beat/gap_fill.h"
 
 namespace {
 

@@ -35,7 +35,7 @@ static_assert(offsetof(TAVO_ONSET_WORKER, fft) == 64 && offsetof(TAVO_ONSET_WORK
 
 extern "C" {
 
-// Fills onset_env[0 .. F - 2] on four threads; leaves it zero when memory runs out. Reads signal,
+// Fills onset_env[0 .. F - 2] on four threads; leaves it as it is if memory runs out. Reads signal,
 // frame_count and mel_matrix (frame_size / 2 rows of 36) of the context, and frame_size, a power of
 // two from 2 to 16384, and hop_size from the arguments, both in samples.
 void _getOnsetEnvelope(TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size);
@@ -45,9 +45,10 @@ void *_tavo_proc_onsetenv(void *record);
 void _thd_cleanup(void *record);
 }
 
-// The same from the samples of a view. Meanwhile the calling thread does the work of beside, once,
-// whatever becomes of the envelope; null for none.
-void fill_onset_envelope(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame_size,
-                         int32_t hop_size, const side_work *beside);
+// The body of _getOnsetEnvelope: reads the samples of view instead of the context's signal, which a
+// job leaves null. Meanwhile the calling thread does the side work beside, exactly once whatever
+// becomes of the envelope; null for none.
+void compute_onset_envelope(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame_size,
+                            int32_t hop_size, const side_work *beside);
 
 #endif

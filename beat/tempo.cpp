@@ -2,7 +2,7 @@
 
 #include <cmath>
 
-#include "dsp/fft.h"
+#include "dsp/dft.h"
 
 namespace {
 

@@ -76,8 +76,9 @@ void run_thres_worker(void *record) {
     free(win);
 }
 
-// Four equal ranges over the places whose window fits. Neighbours share their boundary place; only
-// the earlier worker is given it, so that no place is written by two threads.
+// Four equal ranges over the indices whose window fits; all empty if none fits. Neighbours share
+// their boundary index; only the earlier worker is given it, so that no value is written by two
+// threads.
 void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
                   TAVO_THRES_WORKER *workers, int32_t *done) {
     const int64_t count = beat->frame_count - 1;
@@ -91,6 +92,7 @@ void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
         worker->onset_env = beat->onset_env;
         worker->first = id * share + half + (id == 0 ? 0 : 1);
         worker->last = is_last ? count - half : (id + 1) * share + half;
+        if (beat->frame_count < window) worker->last = worker->first - 1;
         worker->window = window;
         worker->percentile = kPercentile;
         worker->done_flags = done;
@@ -154,27 +156,22 @@ void *_tavo_proc_beatcandi(void *record) {
     run_worker(record, run_thres_worker, _thd_thres_cleanup);
 }
 
-int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, double *thr) {
+int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, float hop, double *thr) {
     const int64_t frames = beat->frame_count;
     const int64_t half = window / 2;
-    if (frames < 2 || window < 2) return 0;
     if (feat_mutex_mt == nullptr || feat_cond_mt == nullptr) return TAVO_ERR_MEMORY;
-    const auto second = static_cast<int32_t>(1.0f / beat->frame_times[0]);
+    const auto second = static_cast<int32_t>(1.0f / hop);
     auto *scratch = zeroed_items<double>(window > second ? window : second);
     if (scratch == nullptr) return TAVO_ERR_MEMORY;
 
-    // One or two values short of a full window, the single place in the middle has what there is.
-    // frames counts the envelope's last entry, which is always 0.
     double top = 0.0;
-    int32_t code = 0;
-    const bool has_place = frames >= window - 2 && half < frames - 1;
-    if (has_place && frames < window) {
-        thr[half] = percentile_of(beat->onset_env, static_cast<int32_t>(frames), scratch);
-        if (thr[half] > top) top = thr[half];
-    } else if (has_place) {
-        code = run_workers(beat, window, thr, &top);
-    }
-    if (code == 0) {
+    const int32_t code = run_workers(beat, window, thr, &top);
+    if (code == 0 && window >= 2) {
+        // One or two values short of a full window, the middle has the percentile of all there are.
+        if (frames < window && frames >= window - 2 && half < frames - 1) {
+            thr[half] = percentile_of(beat->onset_env, static_cast<int32_t>(frames), scratch);
+            if (thr[half] > top) top = thr[half];
+        }
         ramp_tail(thr, frames - 1, window, top);
         fill_head(beat, window, second, thr, scratch);
     }

@@ -31,8 +31,8 @@ void *_tavo_proc_beatcandi(void *record);
 void _thd_thres_cleanup(void *record);
 }
 
-// Fills thr[F - 1] (zero before) for a window of W frames, on four threads. Returns 0; -2 out of
-// memory.
-int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, double *thr);
+// Fills thr[F - 1] (zero before, at least one entry) for a window of W frames, on four threads.
+// hop: seconds a frame. Returns 0; -2 out of memory.
+int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, float hop, double *thr);
 
 #endif

@@ -125,16 +125,6 @@ void beats(benchmark::State &state) {
     free(a.onset.beat_times);
 }
 
-void set_up(benchmark::State &state) {
-    analysis a;
-    open_analysis(&a);
-    for (auto _ : state) {
-        close_analysis(&a);
-        open_analysis(&a);
-    }
-    close_analysis(&a);
-}
-
 void power_rises(benchmark::State &state) {
     analysis a;
     open_analysis(&a);
@@ -200,7 +190,6 @@ int main(int argc, char **argv) {
     add("mode 1: open and decode WAV", open_and_decode);
     add("mode 1: convert, block average from", convert, 44100);
     add("mode 1: beat analysis", beats);
-    add("beats: set up with a scaled signal", set_up);
     add("beats: power rises", power_rises);
     add("beats: onset envelope", onset_envelope);
     add("beats: tempo", tempo);

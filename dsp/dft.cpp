@@ -1,3 +1,5 @@
+#include "dsp/dft.h"
+
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
@@ -7,8 +9,6 @@
 
 namespace {
 
-constexpr double kTwoPi = 6.283185307179586;
-constexpr int64_t kMaxFftSize = 16384;
 constexpr int64_t kMaxCopy = INT64_MAX / 32;  // values; two copies in bytes stay countable
 
 // Two arrays of doubles in one allocation.
@@ -17,15 +17,15 @@ struct complex_copy {
     double *im;
 };
 
-// Room for 2 count doubles. The first used values of re, and of im unless it is null, are copied;
+// Allocates 2 count doubles. The first used values of re, and of im unless it is null, are copied;
 // the rest is zero.
 bool copy_input(complex_copy *copy, const double *re, const double *im, int64_t used,
                 int64_t count) {
     if (count > kMaxCopy) return false;
-    const auto room = static_cast<size_t>(count < 1 ? 1 : count);
-    copy->re = static_cast<double *>(calloc(room, 2 * sizeof(double)));
+    const auto capacity = static_cast<size_t>(count < 1 ? 1 : count);
+    copy->re = static_cast<double *>(calloc(capacity, 2 * sizeof(double)));
     if (copy->re == nullptr) return false;
-    copy->im = copy->re + room;
+    copy->im = copy->re + capacity;
     const auto bytes = static_cast<size_t>(used) * sizeof(double);
     if (bytes > 0) memcpy(copy->re, re, bytes);
     if (bytes > 0 && im != nullptr) memcpy(copy->im, im, bytes);
@@ -35,7 +35,7 @@ bool copy_input(complex_copy *copy, const double *re, const double *im, int64_t 
 // The fast transform spreads one infinite or NaN value over all outputs, where the sums do not
 // everywhere, and its intermediate values must not overflow: such input goes term by term.
 bool suits_fft(const complex_copy &x, int64_t used, int64_t n) {
-    if (n < 2 || n > kMaxFftSize || (n & (n - 1)) != 0) return false;
+    if (!is_fft_size(n)) return false;
     double l1_norm = 0.0;
     for (int64_t i = 0; i < used; ++i) l1_norm += fabs(x.re[i]) + fabs(x.im[i]);
     return std::isfinite(2.0 * l1_norm);

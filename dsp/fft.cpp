@@ -2,19 +2,11 @@
 
 #include <cmath>
 #include <cstdlib>
-
-#include "dsp/lanes.h"
+#include <utility>
 
 namespace {
 
-constexpr double kTwoPi = 6.283185307179586;
-constexpr int32_t kMinSize = 2;
-constexpr int32_t kMaxSize = 16384;       // the largest power of two in 16 bits
 constexpr uint32_t kMaxReverseBits = 31;  // at 32 the mask would never empty
-
-bool is_fft_size(int32_t n) {
-    return n >= kMinSize && n <= kMaxSize && (n & (n - 1)) == 0;
-}
 
 int32_t halvings(int32_t n) {
     int32_t count = 0;
@@ -30,7 +22,7 @@ void fill_twiddles(TAVO_FFT_CTX *ctx, int32_t n) {
     }
 }
 
-// Every double_pair of positions is listed once, at its smaller member.
+// Each swap is listed once, at its lower index; all other entries are 0.
 void fill_bit_reverse(TAVO_FFT_CTX *ctx, int32_t n) {
     const auto bits = static_cast<uint32_t>(ctx->stages);
     for (uint32_t i = 0; i < static_cast<uint32_t>(n); ++i) {
@@ -39,58 +31,38 @@ void fill_bit_reverse(TAVO_FFT_CTX *ctx, int32_t n) {
     }
 }
 
-void permute(double *re, double *im, int32_t n, const uint32_t *bit_reverse) {
+template <typename T>
+void permute(T *re, T *im, int32_t n, const uint32_t *bit_reverse) {
     for (int32_t i = 0; i < n; ++i) {
         const uint32_t r = bit_reverse[i];
         if (r == 0) continue;
-        const double held_re = re[i];
-        const double held_im = im[i];
-        re[i] = re[r];
-        im[i] = im[r];
-        re[r] = held_re;
-        im[r] = held_im;
+        std::swap(re[i], re[r]);
+        std::swap(im[i], im[r]);
     }
 }
 
-// Groups of two elements.
-void first_stage(double *re, double *im, int32_t n, const TAVO_FFT_CTX *ctx) {
-    const double w_re = ctx->cos_table[0];
-    const double w_im = ctx->sin_table[0];
-    for (int32_t top = 0; top < n; top += 2) {
-        const double t_re = re[top + 1] * w_re - im[top + 1] * w_im;
-        const double t_im = re[top + 1] * w_im + im[top + 1] * w_re;
-        const double top_re = re[top];
-        const double top_im = im[top];
-        re[top + 1] = top_re - t_re;
-        im[top + 1] = top_im - t_im;
-        re[top] = top_re + t_re;
-        im[top] = top_im + t_im;
-    }
-}
-
-// Groups of span elements, 4 or more; two neighbouring elements at a time.
-void later_stage(double *re, double *im, int32_t n, int32_t span, const TAVO_FFT_CTX *ctx) {
-    const double *cos_table = ctx->cos_table;
-    const double *sin_table = ctx->sin_table;
-    const int32_t half = span / 2;
-    const int32_t stride = n / span;
-    for (int32_t group = 0; group < n; group += span) {
-        for (int32_t j = 0; j < half; j += 2) {
-            const int32_t top = group + j;
-            const int32_t bottom = top + half;
-            const int32_t w = j * stride;
-            const double_pair w_re = {cos_table[w], cos_table[w + stride]};
-            const double_pair w_im = {sin_table[w], sin_table[w + stride]};
-            const double_pair x_re = load_pair(re + bottom);
-            const double_pair x_im = load_pair(im + bottom);
-            const double_pair t_re = x_re * w_re - x_im * w_im;
-            const double_pair t_im = x_re * w_im + x_im * w_re;
-            const double_pair top_re = load_pair(re + top);
-            const double_pair top_im = load_pair(im + top);
-            store_pair(re + bottom, top_re - t_re);
-            store_pair(im + bottom, top_im - t_im);
-            store_pair(re + top, top_re + t_re);
-            store_pair(im + top, top_im + t_im);
+// Radix 2, decimation in time. T is double, or double_pair for two transforms in one pass.
+template <typename T>
+void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
+    if (ctx->cos_table == nullptr || n != 1 << ctx->stages) return;
+    permute(re, im, n, ctx->bit_reverse);
+    const auto size = static_cast<size_t>(n);
+    for (size_t half = 1; half < size; half *= 2) {
+        const size_t stride = size / 2 / half;
+        for (size_t j = 0; j < half; ++j) {
+            const double w_re = ctx->cos_table[j * stride];
+            const double w_im = ctx->sin_table[j * stride];
+            for (size_t top = j; top < size; top += 2 * half) {
+                const size_t bottom = top + half;
+                const T t_re = re[bottom] * w_re - im[bottom] * w_im;
+                const T t_im = re[bottom] * w_im + im[bottom] * w_re;
+                const T top_re = re[top];
+                const T top_im = im[top];
+                re[bottom] = top_re - t_re;
+                im[bottom] = top_im - t_im;
+                re[top] = top_re + t_re;
+                im[top] = top_im + t_im;
+            }
         }
     }
 }
@@ -115,11 +87,12 @@ void tavo_fft_init(int16_t n, TAVO_FFT_CTX *ctx) {
 }
 
 double *tavo_fft_proc(double *re, double *im, int16_t n, const TAVO_FFT_CTX *ctx) {
-    if (ctx->cos_table == nullptr || n != 1 << ctx->stages) return re;
-    permute(re, im, n, ctx->bit_reverse);
-    first_stage(re, im, n, ctx);
-    for (int32_t span = 4; span <= n; span *= 2) later_stage(re, im, n, span, ctx);
+    transform(re, im, n, ctx);
     return re;
+}
+
+void transform_pair(double_pair *re, double_pair *im, int32_t n, const TAVO_FFT_CTX *ctx) {
+    transform(re, im, n, ctx);
 }
 
 void tavo_fft_deinit(TAVO_FFT_CTX *ctx) {

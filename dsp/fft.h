@@ -1,11 +1,19 @@
-// Fourier transforms of double-precision data in separate real and imaginary arrays. The forward
-// transforms are unscaled, the inverse divides by N. Callers: beat/onset_envelope.h (the FFT of
-// every frame), beat/tempo.h (the direct transforms of one excerpt).
+// The fast Fourier transform, unscaled, of double-precision data in separate real and imaginary
+// arrays. Callers: beat/onset_envelope.h, for every analysis frame; dsp/dft.h.
 #ifndef TAVO_DSP_FFT_H
 #define TAVO_DSP_FFT_H
 
 #include <cstddef>
 #include <cstdint>
+
+#include "dsp/lanes.h"
+
+constexpr double kTwoPi = 6.283185307179586;
+constexpr int32_t kMaxFftSize = 16384;  // the largest power of two in 16 bits
+
+inline bool is_fft_size(int64_t n) {
+    return n >= 2 && n <= kMaxFftSize && (n & (n - 1)) == 0;
+}
 
 // Tables for one size N, a power of two from 2 to 16384. Read-only after tavo_fft_init: one context
 // can be shared by many threads.
@@ -30,17 +38,11 @@ double *tavo_fft_proc(double *re, double *im, int16_t n, const TAVO_FFT_CTX *ctx
 // Releases the tables; a second call does nothing.
 void tavo_fft_deinit(TAVO_FFT_CTX *ctx);
 
-// re[n], im[n] become the transform of the first m values, the rest taken as zero. With real_input
-// the imaginary input is ignored. Returns 0; -2 out of memory, nothing changed.
-int32_t tavo_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_input);
-
-// The first m outputs of the inverse transform of re[n], im[n], in place; entries from m on stay as
-// they were. With real_input the imaginary input is ignored. Returns 0; -2 out of memory, nothing
-// changed.
-int32_t tavo_inverse_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_input);
-
 // x with its lowest bits bits (1 to 31) reversed; 0 for any other bits.
 uint32_t bit_reverse2(uint32_t bits, uint32_t x);
 }
+
+// Two transforms at once, bit-identical to tavo_fft_proc on each lane.
+void transform_pair(double_pair *re, double_pair *im, int32_t n, const TAVO_FFT_CTX *ctx);
 
 #endif

@@ -1,6 +1,7 @@
 // The toolkit: each routine against a form written from its definition.
 #include <complex>
 
+#include "dsp/dft.h"
 #include "dsp/fft.h"
 #include "dsp/matrix.h"
 #include "dsp/peaks.h"

@@ -50,4 +50,19 @@ inline double uniform(std::mt19937 *random) {
     return static_cast<double>((*random)()) / 2147483648.0 - 1.0;
 }
 
+// Samples from -1 to 1; or of any size up to 2^highest; or mostly zeros; or zeros of both signs; or
+// denormal numbers.
+inline std::vector<double> wild_samples(size_t n, int highest, std::mt19937 *random) {
+    std::vector<double> samples(n);
+    const auto kind = (*random)() % 5;
+    for (double &x : samples) {
+        x = uniform(random);
+        if (kind == 1) x = std::ldexp(x, static_cast<int>((*random)() % 200) - 200 + highest);
+        if (kind == 2) x = (*random)() % 3 == 0 ? x : 0.0;
+        if (kind == 3) x = std::ldexp(x, -1074 + static_cast<int>((*random)() % 60));
+        if (kind == 4) x = (*random)() % 2 == 0 ? 0.0 : -0.0;
+    }
+    return samples;
+}
+
 #endif

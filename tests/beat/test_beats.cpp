@@ -5,6 +5,8 @@
 #include <tuple>
 
 #include "beat/click_track.h"
+#include "beat/onset_envelope.h"
+#include "beat/threshold.h"
 #include "tests/beat/beat_fixture.h"
 #include "tests/support/bytes.h"
 #include "tests/support/fault_layer.h"
@@ -49,7 +51,7 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 // Quiet noise, then loud: the onset between them is a beat although only one is asked for and much
 // sharper onsets follow it, out of silence.
-TEST(Beats, RiseForcesABeat) {
+TEST(Beats, APowerRiseForcesABeat) {
     std::mt19937 random(9);
     std::vector<double> song(90 * 11025);
     for (size_t i = 0; i < song.size(); ++i) {
@@ -65,7 +67,7 @@ TEST(Beats, RiseForcesABeat) {
 
 // Four threads take the envelope. A stop before it leaves the tempo alone, one that arrives with it
 // is seen after the tempo, and with the threshold's threads it is too late.
-TEST(Beats, Stop) {
+TEST(Beats, StopIsSeenBeforeTheEnvelopeAndAfterTheTempo) {
     for (const auto &[start, tempo, beats] :
          {std::tuple{0, false, false}, {1, true, false}, {5, true, true}}) {
         analysis of(drum_song(120, 10));
@@ -85,6 +87,33 @@ TEST(Beats, Stop) {
     fault::arm({fault::kMemory, 0});
     EXPECT_EQ(getBeatPosition(&of.ctx), 0);
     fault::disarm();
+}
+
+// Every worker starts, in order, even if the signal has no range for it.
+TEST(Beats, EightWorkersStartWhateverTheLength) {
+    struct start {
+        void *(*entry)(void *);
+        int32_t id;  // first field of both workers' records
+    };
+    static std::vector<start> starts;
+    for (const size_t n : {0u, 1u, 255u, 256u, 257u, 511u, 512u, 767u, 768u, 1024u, 11025u}) {
+        std::mt19937 random(3);
+        analysis of(wild_samples(n, 0, &random));
+        starts.clear();
+        fault::plan plan;
+        plan.thread_watch = [](void *(*entry)(void *), void *record) {
+            starts.push_back({entry, *static_cast<const int32_t *>(record)});
+        };
+        fault::arm(plan);
+        getBeatPosition(&of.ctx);
+        fault::disarm();
+        ASSERT_EQ(starts.size(), 8u) << n;
+        for (int32_t i = 0; i < 8; ++i) {
+            EXPECT_EQ(starts[static_cast<size_t>(i)].entry,
+                      i < 4 ? _tavo_proc_onsetenv : _tavo_proc_beatcandi);
+            EXPECT_EQ(starts[static_cast<size_t>(i)].id, i % 4) << n;
+        }
+    }
 }
 
 // Silence and signals too short for an envelope have 90 BPM and no beats. The file has half the
@@ -123,7 +152,7 @@ TEST(Beats, FileHoldsHalfTheSignalAndTheBlips) {
 }
 
 // i e^(-i/110) cos(2 pi 4000 i / 11025) / 160, at the sample nearest to 11025.44.
-TEST(ClickTrack, Blip) {
+TEST(ClickTrack, BlipIsADecayingTone) {
     const std::vector<float> track = track_of({1000.04f}, 20000);
     EXPECT_EQ(track[11025], 0.0f);
     EXPECT_NEAR(track[11026], -0.0040316, 1e-6);
@@ -135,7 +164,7 @@ TEST(ClickTrack, Blip) {
 
 // 100 ms are 1102.5 samples, which round to 1103; 150 ms are 1653.75. A blip cut short ends one
 // sample before the end. -0.1 ms and the half that rounds are -0.6 of a sample, truncated to 0.
-TEST(ClickTrack, Places) {
+TEST(ClickTrack, BlipsAreCutAtTheEnd) {
     struct piece {
         size_t at, length;  // of the blip, from its start on
     };

@@ -4,6 +4,7 @@
 #include <tuple>
 
 #include "beat/candidates.h"
+#include "beat/gap_fill.h"
 #include "tests/beat/beat_fixture.h"
 
 namespace {
@@ -41,7 +42,7 @@ frames place(const envelope &env) {
     std::copy(env.rises.begin(), env.rises.end(), beat->rise_frames);
     work.of.ctx.onset->bpm = env.bpm;
     work.of.ctx.onset->max_beats = env.max_beats;
-    std::vector<float> out(static_cast<size_t>(candidate_room(beat)));
+    std::vector<float> out(static_cast<size_t>(candidate_capacity(beat)));
     out.resize(static_cast<size_t>(getBeatCandi_MT(beat, work.of.ctx.onset, out.data())));
     frames found;
     for (const float ms : out) {

@@ -6,6 +6,7 @@
 #include <limits>
 #include <vector>
 
+#include "dsp/dft.h"
 #include "dsp/fft.h"
 #include "dsp/matrix.h"
 #include "dsp/mel.h"

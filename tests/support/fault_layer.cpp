@@ -22,6 +22,10 @@ bool fails(uint32_t call) {
     return true;
 }
 
+void report_thread(void *(*entry)(void *), void *record) {
+    if (now.thread_watch != nullptr) now.thread_watch(entry, record);
+}
+
 }  // namespace
 
 namespace fault {
@@ -51,7 +55,7 @@ WRAP(kCalloc, void *, calloc, (size_t items, size_t size), (items, size), nullpt
 WRAP(kRealloc, void *, realloc, (void *block, size_t size), (block, size), nullptr)
 WRAP(kThread, int, pthread_create,
      (pthread_t * id, const pthread_attr_t *how, void *(*run)(void *), void *with),
-     (id, how, run, with), EAGAIN)
+     ((report_thread(run, with), id), how, run, with), EAGAIN)
 WRAP(kMutex, int, pthread_mutex_init, (pthread_mutex_t * lock, const pthread_mutexattr_t *how),
      (lock, how), ENOMEM)
 WRAP(kCondition, int, pthread_cond_init, (pthread_cond_t * wait, const pthread_condattr_t *how),

@@ -32,6 +32,8 @@ struct plan {
     bool forever = false;       // and all later ones
     int error = EIO;            // errno of a failed file call
     void (*watch)() = nullptr;  // runs at the start of each, failed or not
+    // Runs before each thread's start with what it is to run.
+    void (*thread_watch)(void *(*entry)(void *), void *record) = nullptr;
 };
 
 // From now on by this plan. No other thread of the library may run.

@@ -1,0 +1,175 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstring>
+
+#include "beat/onset_envelope.h"
+#include "dsp/matrix.h"
+#include "dsp/stats.h"
+#include "tests/beat/beat_fixture.h"
+
+namespace {
+
+// Bit-identical, or both NaN.
+bool same_bits(const double *a, const std::vector<double> &b) {
+    for (size_t i = 0; i < b.size(); ++i) {
+        if (std::isnan(b[i]) ? !std::isnan(a[i]) : memcmp(&a[i], &b[i], sizeof b[i]) != 0)
+            return false;
+    }
+    return true;
+}
+
+// A frame by the exported functions of the toolkit.
+struct plain_frame {
+    TAVO_FFT_CTX fft = {};
+    std::vector<double> window;
+
+    explicit plain_frame(int32_t size) {
+        tavo_fft_init(static_cast<int16_t>(size), &fft);
+        for (int32_t i = 0; i < size; ++i)
+            window.push_back(0.5 * (1.0 - cos(6.283185307179586 * i / (size - 1))));
+    }
+    plain_frame(const plain_frame &) = delete;
+    ~plain_frame() { tavo_fft_deinit(&fft); }
+
+    std::vector<float> powers(const double *samples) const {
+        const size_t size = window.size();
+        std::vector<double> re(size), im(size);
+        for (size_t i = 0; i < size; ++i) re[i] = samples[i] * window[i];
+        tavo_fft_proc(re.data(), im.data(), static_cast<int16_t>(size), &fft);
+        std::vector<float> power;
+        for (size_t j = 0; j < size / 2; ++j)
+            power.push_back(static_cast<float>(re[j] * re[j] + im[j] * im[j]));
+        return power;
+    }
+    std::vector<double> decibels(const double *samples, const float *const *weights) const {
+        const std::vector<float> power = powers(samples);
+        const float *spectrum = power.data();
+        std::vector<double> row(36);
+        double *out = row.data();
+        MultiplyMtxs(1, 36, static_cast<int32_t>(power.size()), &spectrum, weights, &out);
+        for (double &x : row) x = 20.0 * log10(std::max(x, 0.0001));
+        return row;
+    }
+};
+
+// Frames in steps of hop.
+std::vector<double> envelope(const TAVO_BEAT_CTX &beat, int32_t size, int32_t hop) {
+    const plain_frame frame(size);
+    std::vector<double> change, next, now = frame.decibels(beat.signal, beat.mel_matrix);
+    for (int64_t k = 1; k < beat.frame_count; ++k, now = next) {
+        next = frame.decibels(beat.signal + k * hop, beat.mel_matrix);
+        double sum = 0.0;
+        for (size_t b = 0; b < 36; ++b)
+            sum += std::isnan(next[b] - now[b]) ? 0.0 : fabs(next[b] - now[b]);
+        change.push_back(sum / 36);
+    }
+    double mean = 0.0, deviation = 0.0;
+    getMeanStd(change.data(), beat.frame_count - 1, &mean, &deviation);
+    for (double &x : change) x /= deviation;
+    return change;
+}
+
+}  // namespace
+
+TEST(BeatCtx, OfOneSecondHas42Frames) {
+    analysis of(std::vector<double>(11025));
+    of.ana[3] = -32768.0;
+    of.ana[11024] = 16383.5;
+    TAVO_BEAT_CTX beat = {};
+    __beat_init(&of.ctx, &beat);
+    EXPECT_EQ(beat.frame_count, 42);  // (11025 - 512) / 256 + 1
+    EXPECT_EQ(beat.frame_times[41], 0.02321995465f * 42.0f);
+    EXPECT_EQ(beat.signal[3], -32768.0 / 32767.0);
+    EXPECT_EQ(beat.signal[11024], 0.5);
+    EXPECT_EQ(std::count(beat.rise_flags, beat.rise_flags + 11025, 0), 11025);
+    // 39.817379 mel in 37 steps of 71.743 Hz below 1 kHz; bins 21.533 Hz apart; a top of 2 /
+    // 143.486.
+    const float lowest[] = {0.0f,       0.0041836f, 0.0083671f, 0.0125507f,
+                            0.0111427f, 0.0069591f, 0.0027756f, 0.0f};
+    for (int bin = 0; bin < 8; ++bin) EXPECT_NEAR(beat.mel_matrix[bin][0], lowest[bin], 1e-6);
+    EXPECT_TRUE(feat_mutex_mt != nullptr && feat_cond_mt != nullptr);
+    __tavo_deinit(&beat);
+    EXPECT_TRUE(feat_mutex_mt == nullptr && feat_cond_mt == nullptr);
+}
+
+// Ranges of any number of frames; all sizes, which the arguments give, not the context; silence,
+// samples and weights that are not finite; weights of either sign and zero.
+TEST(OnsetEnvelope, EqualsTheFramesOneByOne) {
+    std::mt19937 random(6);
+    const auto below = [&](uint32_t limit) { return static_cast<int32_t>(random() % limit); };
+    for (int round = 0; round < 200; ++round) {
+        SCOPED_TRACE(round);
+        const int32_t size = round % 4 == 0 ? 2 << below(10) : 512;
+        const int32_t hop = round % 3 == 0 ? 1 + below(700) : 256;
+        working_context work(2 + below(45), size, hop);
+        TAVO_BEAT_CTX *beat = &work.beat;
+        const size_t n = work.of.ana.size();
+        const std::vector<double> samples = wild_samples(n, 20 << round % 6, &random);
+        std::copy(samples.begin(), samples.end(), beat->signal);
+        if (round % 5 == 1) beat->signal[random() % n] = round % 2 == 0 ? NAN : INFINITY;
+        if (round % 8 == 2) {  // an infinite weight of a power that is zero at first
+            beat->mel_matrix[below(256)][below(36)] = INFINITY;
+            std::fill_n(beat->signal, n / 2, 0.0);
+        }
+        for (int32_t i = 0; i < size * 9 && round % 8 == 3; ++i)
+            beat->mel_matrix[i / 18][below(36)] = static_cast<float>(below(3) - 1);
+        beat->half_frame = beat->band_count = 0;
+        _getOnsetEnvelope(beat, size, hop);
+        beat->half_frame = size / 2;  // rows to release
+        EXPECT_TRUE(same_bits(beat->onset_env, envelope(*beat, size, hop)));
+        EXPECT_EQ(beat->onset_env[beat->frame_count - 1], 0.0);
+    }
+}
+
+// A worker of the caller's own, with rows of the caller's own. Without a window, a tone of a whole
+// number of periods leaves rounding errors alone in all other bins: powers, which are rounded to
+// single precision, hide them elsewhere.
+TEST(OnsetWorker, FillsItsOwnRowsAsFramesOneByOne) {
+    std::mt19937 random(5);
+    plain_frame frame(512);
+    const working_context work(2);
+    for (int round = 0; round < 400; ++round) {
+        frame.window.assign(512, 1.0);
+        std::vector<double> samples = wild_samples(2000, 50, &random);
+        for (size_t i = 0; i < samples.size() && round % 2 == 0; ++i)
+            samples[i] = cos(6.283185307179586 / 512 * static_cast<double>(i) * (round % 100));
+        float spectrum[6][256] = {}, *spectrum_rows[6];
+        double mel[6][36] = {}, *mel_rows[6];
+        for (size_t k = 0; k < 6; ++k) {
+            spectrum_rows[k] = spectrum[k];
+            mel_rows[k] = mel[k];
+        }
+        int32_t done[4] = {1, 1, 0, 1};
+        TAVO_ONSET_WORKER worker = {};
+        worker.id = 2;
+        worker.signal = samples.data();
+        worker.first = round % 3;
+        worker.last = round % 5 - 1;
+        worker.spectrum = spectrum_rows;
+        worker.frame_size = 512;
+        worker.hop_size = 1 + static_cast<int32_t>(random() % 299);
+        worker.fft = &frame.fft;
+        worker.done_flags = done;
+        worker.thread_count = 4;
+        worker.mutex = feat_mutex_mt;
+        worker.cond = feat_cond_mt;
+        worker.band_count = 36;
+        worker.mel_matrix = work.beat.mel_matrix;
+        worker.mel = mel_rows;
+        worker.window = frame.window.data();
+        ASSERT_EQ(pthread_create(&worker.thread, nullptr, _tavo_proc_onsetenv, &worker), 0);
+        pthread_join(worker.thread, nullptr);
+        EXPECT_EQ(done[2], 1);
+        for (int64_t k = 0; k < 6; ++k) {
+            const double *first = samples.data() + k * worker.hop_size;
+            const bool own = k >= worker.first && k <= worker.last;
+            std::vector<float> power(256);
+            std::vector<double> row(36);
+            if (own) power = frame.powers(first);
+            if (own) row = frame.decibels(first, worker.mel_matrix);
+            ASSERT_EQ(memcmp(spectrum[k], power.data(), sizeof spectrum[k]), 0) << round;
+            ASSERT_TRUE(same_bits(mel[k], row)) << round;
+        }
+    }
+}

@@ -1,0 +1,133 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+
+#include "beat/power_rise.h"
+#include "tests/beat/beat_fixture.h"
+
+namespace {
+
+constexpr size_t kBlock = 5512;
+
+// Constant samples of this level, 16-bit scale.
+double sample_of_level(double level) {
+    return sqrt((level + 0.5) / 32767.0);
+}
+
+// Every sample's level by itself, dB; at a block's last sample, the largest of the block. block:
+// the same for each half second, -150 where none was measured.
+std::vector<double> plain_levels(const std::vector<double> &signal, std::vector<double> *block) {
+    std::vector<double> db(signal.size(), -150.0);
+    block->assign(signal.size() / kBlock + 1, -150.0);
+    int32_t held = 0;
+    double loudest = -150.0;
+    for (size_t i = 5; i + 5 <= signal.size(); ++i) {
+        double sum = 0.0;
+        for (size_t k = i - 5; k < i + 5; ++k) sum += signal[k] * signal[k];
+        const double mean = sum / 10.0 * 32767.0;
+        const int32_t value = mean > 0.0 ? static_cast<int32_t>(std::min(mean, 32767.0)) : 0;
+        const int32_t level = std::max(value, held);
+        held = level - level / 1000;
+        db[i] = 20.0 * std::log10(std::max(level, 1000) / 32767.0);
+        loudest = std::max(loudest, db[i]);
+        if (i % kBlock != 0) continue;
+        db[i] = (*block)[i / kBlock] = loudest;
+        loudest = -150.0;
+    }
+    return db;
+}
+
+std::vector<int32_t> plain_rises(const std::vector<double> &signal) {
+    std::vector<int32_t> flags(signal.size());
+    std::vector<double> block;
+    const std::vector<double> db = plain_levels(signal, &block);
+    const size_t count = block.size();
+    if (count < 3) return flags;
+    std::vector<double> sorted = block;
+    std::sort(sorted.begin(), sorted.end());
+    const double p60 = sorted[static_cast<size_t>(static_cast<double>(count) * 0.6)];
+    const double p40 = sorted[static_cast<size_t>(static_cast<double>(count) * 0.4)];
+    block.resize(count + 8, -150.0);
+    for (size_t b = 2; b < count; ++b) {
+        double mean = 0.0;
+        for (size_t k = 0; k < 8; ++k) mean += block[b + k];
+        mean *= 0.125;
+        const double limit = std::min((p60 + p40) * 0.5, mean - 4.0);
+        if (!(block[b - 2] < limit && block[b - 1] < limit)) continue;
+        if (!(mean >= p60 - 3.0 && block[b] > p60 - 3.0)) continue;
+        const double target = (mean + 3.0 * p60) * 0.5;
+        size_t i = kBlock * (b - 1);
+        while (i <= kBlock * b && !(db[i] >= target)) ++i;
+        if (i > kBlock * b) continue;
+        flags[i] = 1;
+        b += 6;  // and the loop's own step
+    }
+    return flags;
+}
+
+// Noise whose loudness changes about once in two seconds, of n samples.
+std::vector<double> changing_noise(size_t n, std::mt19937 *random) {
+    std::vector<double> signal(n);
+    double loudness = 0.1;
+    for (double &x : signal) {
+        if ((*random)() % 25000 == 0) loudness = pow(10.0, -1.5 * fabs(uniform(random)));
+        x = loudness * uniform(random);
+    }
+    return signal;
+}
+
+}  // namespace
+
+// Silence is at the floor of -30.31 dB, sample 0.5 at level 8191, -12.04 dB. P60 is -12.04, the
+// target twice that, level 2048: three of the ten samples around i, each 819 of the mean, must be
+// loud. 20 blocks are measured, block b over samples 5512 (b - 1) + 1 to 5512 b.
+TEST(PowerRise, IsAtTheFirstSampleAboveTheTarget) {
+    constexpr size_t kBegin = 10 * kBlock;
+    const struct {
+        size_t start;
+        double sample;
+        size_t rise;  // 0: none
+    } cases[] = {
+        {kBegin + 2000, 0.5, kBegin + 1998},
+        {kBegin + 3, 0.5, kBegin + 1},
+        {kBlock + 2000, 0.5, kBlock + 1998},  // block 0 is never measured and counts as quiet
+        // Levels below 1000 count as the floor. A step to -28.03 dB (level 1300) is too low, its
+        // limit being -32.03; one to -24.29 dB (2000) is not, and its target is below the floor.
+        {kBegin + 2000, sample_of_level(1300), 0},
+        {kBegin + 2000, sample_of_level(2000), kBegin},
+        // Ten samples of -32768 have a mean of 32769, beyond 16 bits. The target is the top, 0 dB,
+        // which only ten loud samples reach.
+        {kBegin + 2000, -32768.0 / 32767.0, kBegin + 2005},
+        {kBegin + kBlock - 5, -32768.0 / 32767.0, kBegin + kBlock},  // at the block's last sample
+    };
+    for (const auto &c : cases) {
+        std::vector<double> signal(20 * kBlock + 100, c.sample);
+        std::fill_n(signal.begin(), c.start, 0.0);
+        std::vector<int32_t> flags(signal.size()), expected(signal.size());
+        if (c.rise > 0) expected[c.rise] = 1;
+        EXPECT_EQ(
+            detectPowerVariation(signal.data(), flags.data(), static_cast<int64_t>(signal.size())),
+            c.rise > 0 ? 1 : 0);
+        EXPECT_TRUE(flags == expected) << c.start << " " << c.sample;
+    }
+}
+
+// All lengths around a whole block; noise, wild values, NaN and infinities, and samples whose means
+// are whole levels, so that a single rounding decides.
+TEST(PowerRise, EqualsTheLevelsSampleBySample) {
+    std::mt19937 random(7);
+    int found = 0;
+    for (int round = 0; round < 80; ++round) {
+        const size_t n = (random() % 50) * kBlock + random() % (round % 2 == 0 ? 12 : kBlock);
+        std::vector<double> signal =
+            round % 4 == 0 ? wild_samples(n, 20, &random) : changing_noise(n, &random);
+        for (double &x : signal)
+            if (round % 4 == 1) x = sqrt(floor(3276.7 * fabs(x)) * 10.0 / 32767.0);
+        if (round % 8 == 3 && n > 0) signal[0] = 4.0;  // in the first sum alone
+        if (round % 6 == 0 && n > 0) signal[random() % n] = round % 4 == 0 ? NAN : INFINITY;
+        std::vector<int32_t> flags(n);
+        found += detectPowerVariation(signal.data(), flags.data(), static_cast<int64_t>(n));
+        ASSERT_TRUE(flags == plain_rises(signal)) << round;
+    }
+    EXPECT_GT(found, 15);
+}
