@@ -1,4 +1,5 @@
-// The command: options, the files they name, their results. See options.h, inputs.h, workers.h.
+// The command: options, the files they name, their results. See options.h, inputs.h,
+// analyse_inputs.h.
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -6,9 +7,8 @@
 #include <exception>
 
 #include "cli/options.h"
-#include "cli/run/forecast.h"
+#include "cli/run/analyse_inputs.h"
 #include "cli/run/stop.h"
-#include "cli/run/workers.h"
 
 namespace {
 
@@ -28,7 +28,7 @@ int run(int argc, char **argv) {
         perror("tavo");
         return kExitFailed;
     }
-    return opts.forecast.empty() ? run_workers(opts, {}) : run_forecast(opts);
+    return analyse_inputs(opts);
 }
 
 }  // namespace

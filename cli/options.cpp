@@ -147,6 +147,10 @@ void declare_analysis(CLI::App &app, options &out, raw_values &raw) {
                    "Files analysed at once, each in a process of its own; 1 by default")
         ->check(whole(1, kMostJobs, ""))
         ->type_name("N");
+    app.add_option("--timeout", out.timeout_s,
+                   "Give up a file whose analysis takes longer; by default none is given up")
+        ->check(whole(0, kMostSeconds, " of seconds"))
+        ->type_name("SECONDS");
 }
 
 void declare_output(CLI::App &app, options &out, raw_values &raw) {
@@ -196,6 +200,7 @@ void declare_catalogue(CLI::App &app, options &out, raw_values &raw) {
     app.add_flag("--from-store", out.from_store,
                  "Write out what the store holds for --mode, --length and --max-beats; analyses "
                  "nothing");
+    app.add_flag("--failed", out.failed, "With --from-store: the songs that failed, and why");
     app.add_option("--patience", out.patience_s,
                    "How long a store that does not answer is tried again; 60 by default")
         ->check(whole(0, kMostSeconds, " of seconds"))
@@ -204,23 +209,6 @@ void declare_catalogue(CLI::App &app, options &out, raw_values &raw) {
                    "Only the share I of N of the inputs, for engines that run one command many "
                    "times; auto: as Slurm, Kubernetes or AWS Batch says")
         ->type_name("I/N");
-    app.add_option("--forecast", out.forecast,
-                   "Analyse a random sample of a list and say what all of it needs")
-        ->type_name("LIST");
-    app.add_option("--sample", out.sample, "Files in the sample; 1000 by default")
-        ->check(whole(2, kMostBeats, ""))
-        ->type_name("N");
-    app.add_option("--files", out.forecast_files,
-                   "Forecast for so many files instead of the list's")
-        ->check(whole(1, kMostBeats, ""))
-        ->type_name("N");
-    app.add_option("--cores", out.cores, "Processors to forecast for; 1 by default")
-        ->check(whole(1, kMostBeats, ""))
-        ->type_name("N");
-    app.add_option("--bandwidth", out.bandwidth,
-                   "Speed of the storage to forecast for; 100 by default")
-        ->check(whole(1, kMostBeats, ""))
-        ->type_name("MB/S");
 }
 
 void declare_inputs(CLI::App &app, options &out, raw_values &raw) {
@@ -242,12 +230,12 @@ bool is_folder(const std::string &path) {
 
 void set_values(const raw_values &raw, options &out) {
     out.mode = mode_of(raw.mode);
-    if (raw.format.empty() && !out.store.empty()) out.format = result_format::none;
+    if (raw.format.empty() && !out.store.empty() && !out.failed) out.format = result_format::none;
     for (const format_word &entry : kFormats) {
         if (raw.format == entry.word) out.format = entry.format;
     }
     if (!raw.fps.empty()) out.fps = raw.fps;
-    for (std::string *path : {&out.click, &out.plot, &out.report, &out.store, &out.forecast}) {
+    for (std::string *path : {&out.click, &out.plot, &out.report, &out.store}) {
         unshield(*path);
     }
     unshield(out.output_dir);
@@ -256,16 +244,17 @@ void set_values(const raw_values &raw, options &out) {
     if (raw.null_separated) out.list_separator = '\0';
 }
 
-// What is wrong with the options about the store and the forecast.
+// What is wrong with the options about the store.
 std::string catalogue_contradiction(const options &out) {
     const bool nothing_named = out.inputs.empty() && out.lists.empty();
     if (out.store.empty() && (out.from_store || out.redo || out.retry_failed)) {
         return "--from-store, --redo and --retry-failed are about a --store.";
     }
     if (out.redo && out.retry_failed) return "--redo analyses failed songs too.";
-    if ((out.from_store || !out.forecast.empty()) && !nothing_named) {
-        return std::string(out.from_store ? "--from-store" : "--forecast") +
-               " takes no other inputs.";
+    if (out.from_store && !nothing_named) return "--from-store takes no other inputs.";
+    if (out.failed && !out.from_store) return "--failed goes with --from-store.";
+    if (out.failed && (writes_files(out.format) || !out.report.empty())) {
+        return "--failed goes with --format text, json or csv.";
     }
     if (out.from_store && out.format == result_format::none && out.report.empty()) {
         return "--from-store needs --format or --report.";
@@ -277,7 +266,7 @@ std::string catalogue_contradiction(const options &out) {
 std::string contradiction(const options &out, const raw_values &raw) {
     const bool list_on_stdin =
         std::find(out.inputs.begin(), out.inputs.end(), "-") != out.inputs.end();
-    if (out.inputs.empty() && out.lists.empty() && !out.from_store && out.forecast.empty()) {
+    if (out.inputs.empty() && out.lists.empty() && !out.from_store) {
         return "name at least one audio file, a folder, or '-' for a list on standard input.";
     }
     if (raw.null_separated && !list_on_stdin && out.lists.empty()) {

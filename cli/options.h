@@ -1,4 +1,4 @@
-// The command line, read once. In: argc, argv. Out: options. Before: inputs.h, workers.h.
+// The command line, read once. In: argc, argv. Out: options. Before: inputs.h, analyse_inputs.h.
 #ifndef TAVO_CLI_OPTIONS_H
 #define TAVO_CLI_OPTIONS_H
 
@@ -40,17 +40,14 @@ struct options {
     bool quiet = false;
     std::string store;        // URL of the database, empty for none
     bool from_store = false;  // its results are written out, nothing is analysed
+    bool failed = false;      // with from_store: failures instead of results
     bool retry_failed = false;
     bool redo = false;
     int32_t patience_s = 60;  // how long a database that is away is asked again
     shard share;
-    std::string forecast;        // a list to take a sample of, empty for none
-    int32_t sample = 1000;       // files in it
-    int64_t forecast_files = 0;  // the number to forecast for, 0 for the list's
-    int32_t cores = 1;
-    int32_t bandwidth = 100;  // MB/s
     bool recursive = false;
     int32_t jobs = 1;
+    int32_t timeout_s = 0;            // of one file's analysis, 0 for none
     char list_separator = '\n';       // of the lists that name files
     std::vector<std::string> lists;   // files that name files, "-" for standard input
     std::vector<std::string> inputs;  // in the order given; "-" is a list on standard input

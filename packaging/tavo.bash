@@ -22,16 +22,15 @@ _tavo() {
             59.94df 60' -- "$word") ;;
         --shard) mapfile -t COMPREPLY < <(compgen -W 'auto' -- "$word") ;;
         -o | --output-dir) mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
-        -l | --length | -j | --jobs | --max-beats | --patience | --sample | --files | --cores | --bandwidth) ;; # a number
-        --click | --plot | --report | --files-from | --store | --forecast) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
+        -l | --length | -j | --jobs | --max-beats | --patience | --timeout) ;; # a number
+        --click | --plot | --report | --files-from | --store) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
         *)
             if [[ $word == -* ]]; then
                 mapfile -t COMPREPLY < <(compgen -W '-h --help --version
-                    -m --mode -l --length --max-beats -j --jobs
+                    -m --mode -l --length --max-beats -j --jobs --timeout
                     -f --format -o --output-dir --fps --force --skip-existing --click --plot --report --embed -q --quiet
                     -r --recursive --files-from -0 --null
-                    --store --retry-failed --redo --from-store --patience --shard
-                    --forecast --sample --files --cores --bandwidth' -- "$word")
+                    --store --retry-failed --redo --from-store --failed --patience --shard' -- "$word")
             else
                 mapfile -t COMPREPLY < <(compgen -f -- "$word")
             fi

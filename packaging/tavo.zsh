@@ -7,6 +7,7 @@ _arguments -s -S \
   '(-l --length)'{-l+,--length=}'[length of the highlight wanted]:seconds:' \
   '--max-beats=[maximum number of threshold-selected beats]:number:' \
   '(-j --jobs)'{-j+,--jobs=}'[files analysed at once]:number:' \
+  '--timeout=[give up a file whose analysis takes longer]:number:' \
   '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive losslesscut ffmetadata edl fcpxml reaper)' \
   '(-o --output-dir)'{-o+,--output-dir=}'[folder for the marker files]:folder:_files -/' \
   '--fps=[frames a second for edl and fcpxml]:rate:(23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60)' \
@@ -24,11 +25,7 @@ _arguments -s -S \
   '--retry-failed[analyse songs again that failed]' \
   '--redo[analyse every song again]' \
   '--from-store[write out what the store holds]' \
+  '--failed[with --from-store: the songs that failed]' \
   '--patience=[seconds that a store without an answer is tried again]:number:' \
   '--shard=[only a share of the inputs, I/N]:share:(auto)' \
-  '--forecast=[say what a list of files needs]:file:_files' \
-  '--sample=[files in the sample of a forecast]:number:' \
-  '--files=[files to forecast for]:number:' \
-  '--cores=[processors to forecast for]:number:' \
-  '--bandwidth=[speed of the storage to forecast for, MB/s]:number:' \
   '*:audio file or folder:_files'

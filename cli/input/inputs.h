@@ -1,6 +1,6 @@
 // From the words of the command line to the files to analyse, one at a time and in their order.
 //
-// In: options (files, folders, lists). Out: one input per file. Before: workers.h.
+// In: options (files, folders, lists). Out: one input per file. Before: analyse_inputs.h.
 #ifndef TAVO_CLI_INPUT_INPUTS_H
 #define TAVO_CLI_INPUT_INPUTS_H
 

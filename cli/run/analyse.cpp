@@ -37,15 +37,19 @@ bool wait_for_result(int done_fd, int stop_fd) {
     }
 }
 
-void take_stream(const TAVO_CTX *ctx, record &out) {
+void read_stream(const TAVO_CTX *ctx, record &out) {
     tavo_get_stream(ctx, &out.sample_rate, &out.channels, &out.duration_ms);
     out.has_stream = true;
 }
 
 // After the callback the job writes nothing any more.
-void take_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
+void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
     if (tavo_has_audio(ctx) == 0) {
         out.error = "No audio could be decoded from the file.";
+        return;
+    }
+    if (tavo_is_complete(ctx) == 0) {
+        out.error = "The file could not be read to its end.";
         return;
     }
     out.has_highlight = out.mode != TAVO_MODE_BEATS;
@@ -65,7 +69,7 @@ void take_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
 
 // Runs the job of an instance and releases it.
 void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
-    take_stream(ctx, out);
+    read_stream(ctx, out);
     int done_pipe[2];
     if (pipe(done_pipe) != 0) {
         out.error = system_sentence("The analysis could not be started", errno);
@@ -79,7 +83,7 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
     if (code != TAVO_OK) {
         out.error = "The analysis could not be started (code " + std::to_string(code) + ").";
     } else if (wait_for_result(done_pipe[0], stop_fd)) {
-        take_result(ctx, result.load(), out);
+        read_result(ctx, result.load(), out);
     } else {
         out.status = outcome::stopped;
         out.error = "The analysis was stopped.";

@@ -1,7 +1,7 @@
 // One file becomes one record: the library's instance from creation to release.
 //
-// In: a path and options. Out: a record. Runs in a worker process (worker.h), which holds at most
-// one instance at a time. After: format.h.
+// In: a path and options. Out: a record. Runs in a worker process (worker_process.h), which holds
+// at most one instance at a time. After: format.h.
 #ifndef TAVO_CLI_RUN_ANALYSE_H
 #define TAVO_CLI_RUN_ANALYSE_H
 

@@ -24,15 +24,15 @@ void write_result(ordered_output &out, const std::string &text) {
 }
 
 // A part of the index could not be written.
-void note_index_error(ordered_output &out, const std::string &error) {
-    if (error.empty()) return;
+void note_index_failure(ordered_output &out, const failure &failed) {
+    if (!failed) return;
     out.a_file_failed = true;
-    write_message(out, "tavo: " + error + "\n");
+    write_message(out, "tavo: " + failed.sentence + "\n");
 }
 
 void write_reply(ordered_output &out, const reply &made) {
     if (made.status == outcome::stopped) return;
-    note_index_error(out, add_report_row(out.index, made.row));
+    note_index_failure(out, {add_report_row(out.index, made.row)});
     if (made.status == outcome::failed) out.a_file_failed = true;
     write_result(out, made.result);
     if (!output_failed(out)) write_message(out, made.message);
@@ -40,14 +40,14 @@ void write_reply(ordered_output &out, const reply &made) {
 
 }  // namespace
 
-std::string start_output(ordered_output &out, const options &opts) {
-    const std::string error = begin_report_index(out.index, opts);
-    if (!error.empty()) return "tavo: " + error + "\n";
+failure start_output(ordered_output &out, const options &opts) {
+    failure failed = {begin_report_index(out.index, opts)};
+    if (failed) return failed;
     struct stat info {};
     out.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
     out.bar = start_progress(opts.quiet);
     write_result(out, format_head(opts.format));
-    return "";
+    return {};
 }
 
 void set_total(ordered_output &out, size_t total) {
@@ -88,9 +88,9 @@ void redraw(ordered_output &out) {
     draw_progress(out.bar, out.done);
 }
 
-int finish_output(ordered_output &out, const options &opts, bool unclean) {
+int finish_output(ordered_output &out, const options &opts, bool has_other_error) {
     clear_progress(out.bar);
-    note_index_error(out, finish_report_index(out.index, opts));
+    note_index_failure(out, {finish_report_index(out.index, opts)});
     if (out.write_error != 0) {
         write_message(
             out,
@@ -104,5 +104,5 @@ int finish_output(ordered_output &out, const options &opts, bool unclean) {
         return kExitSignal + stop_signal();
     }
     if (out.reader_gone) return kExitSignal + SIGPIPE;
-    return out.a_file_failed || out.write_error != 0 || unclean ? kExitFailed : kExitOk;
+    return out.a_file_failed || out.write_error != 0 || has_other_error ? kExitFailed : kExitOk;
 }

@@ -8,10 +8,11 @@
 #include <map>
 #include <string>
 
+#include "cli/failure.h"
 #include "cli/options.h"
 #include "cli/report/report.h"
+#include "cli/run/messages.h"
 #include "cli/run/progress.h"
-#include "cli/run/worker.h"
 
 struct ordered_output {
     std::map<size_t, reply> waiting;  // for earlier inputs
@@ -26,8 +27,8 @@ struct ordered_output {
     progress bar;
 };
 
-// Returns an empty string or, when the report's index cannot be begun, lines for standard error.
-std::string start_output(ordered_output &out, const options &opts);
+// Fails if the report's index cannot be begun.
+failure start_output(ordered_output &out, const options &opts);
 void set_total(ordered_output &out, size_t total);  // once all inputs are known
 void accept_reply(ordered_output &out, size_t index, reply &&made);
 void write_message(ordered_output &out, const std::string &text);
@@ -38,7 +39,8 @@ int redraw_timeout_ms(const ordered_output &out);  // for poll: -1 when there is
 void redraw(ordered_output &out);
 
 // After the last reply: finishes the report's index, says what went wrong with the output and that
-// the work was stopped, if it was. Returns the exit status.
-int finish_output(ordered_output &out, const options &opts, bool unclean);
+// the work was stopped, if it was. Returns the exit status; has_other_error: something but a file
+// has failed.
+int finish_output(ordered_output &out, const options &opts, bool has_other_error);
 
 #endif

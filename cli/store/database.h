@@ -9,6 +9,8 @@
 #include <variant>
 #include <vector>
 
+#include "cli/failure.h"
+
 struct bytes {
     std::string value;  // any bytes, NUL included
 };
@@ -23,18 +25,28 @@ struct database_kind {
     const char *json_type;
     size_t longest_path;  // bytes that an index takes
 
-    // These return an empty string or the database's own words.
-    std::string (*open)(const std::string &where, void **handle);
-    std::string (*run)(void *handle, const std::string &sql, const row &values,
-                       const std::function<void(const row &)> &on_row);
+    // The version of the store's table, 0 where there is none.
+    const char *version_query;
+    std::string (*set_version_statement)(int version);
+    // Makes other commands that upgrade the table wait until the transaction's end.
+    const char *begin_upgrade[2];
+
+    // Sentences are the database's own text. A failure that a new attempt cannot overcome is
+    // permanent: a damaged file, a missing table or right.
+    failure (*open)(const std::string &location, bool read_only, void **handle);
+    failure (*run)(void *handle, const std::string &sql, const row &values,
+                   const std::function<void(const row &)> &on_row);
     void (*close)(void *handle);  // accepts null
 };
 
-// The kind that a store's URL names and, in where, what its open takes. Null with a sentence in
-// error when the URL is of no kind, or of one that this program was built without.
-const database_kind *find_database(const std::string &url, std::string &where, std::string &error);
+// Finds the kind of database that a store's URL names and, in location, the argument of its open.
+failure find_database(const std::string &url, const database_kind **kind, std::string &location);
 
-// Null where the program was built without.
+// The text without any part of the user and password in the URL: what is between :// and the last
+// @.
+std::string without_credentials(const std::string &text, const std::string &url);
+
+// Null where the program was built without that database.
 const database_kind *sqlite_database();
 const database_kind *postgresql_database();
 

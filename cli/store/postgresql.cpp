@@ -2,6 +2,7 @@
 
 #include <cstdlib>
 #include <memory>
+#include <string_view>
 
 #include "cli/store/database.h"
 
@@ -19,17 +20,28 @@ std::string sentence(const char *words) {
     return text;
 }
 
-std::string connect(const std::string &where, void **handle) {
-    PGconn *connection = PQconnectdb(where.c_str());
+// Only the classes of errors that pass: of the connection, of transactions that ran beside each
+// other, of resources, of locks, of a server that is being stopped. Without a code it is gone.
+bool is_permanent(const char *sql_state) {
+    if (sql_state == nullptr) return false;
+    const std::string_view code_class(sql_state, 2);
+    for (const char *passing : {"08", "40", "53", "55", "57", "58"}) {
+        if (code_class == passing) return false;
+    }
+    return true;
+}
+
+failure connect(const std::string &location, bool /*read_only*/, void **handle) {
+    PGconn *connection = PQconnectdb(location.c_str());
     if (PQstatus(connection) != CONNECTION_OK) {
-        const std::string error = sentence(PQerrorMessage(connection));
+        failure failed = {sentence(PQerrorMessage(connection))};
         PQfinish(connection);
-        return error;
+        return failed;
     }
     PQsetNoticeProcessor(
         connection, [](void *, const char *) {}, nullptr);
     *handle = connection;
-    return "";
+    return {};
 }
 
 // Values as the protocol takes them: numbers and text as text, bytes as they are.
@@ -74,8 +86,8 @@ cell column(const PGresult *result, int line, int index) {
                           : bytes{std::string(reinterpret_cast<const char *>(raw.get()), size)};
 }
 
-std::string run(void *handle, const std::string &sql, const row &values,
-                const std::function<void(const row &)> &on_row) {
+failure run(void *handle, const std::string &sql, const row &values,
+            const std::function<void(const row &)> &on_row) {
     auto *connection = static_cast<PGconn *>(handle);
     const parameters given = make_parameters(values);
     const std::unique_ptr<PGresult, decltype(&PQclear)> result(
@@ -84,7 +96,8 @@ std::string run(void *handle, const std::string &sql, const row &values,
         PQclear);
     const ExecStatusType status = PQresultStatus(result.get());
     if (status != PGRES_COMMAND_OK && status != PGRES_TUPLES_OK) {
-        return sentence(PQerrorMessage(connection));
+        return {sentence(PQerrorMessage(connection)),
+                is_permanent(PQresultErrorField(result.get(), PG_DIAG_SQLSTATE))};
     }
     for (int line = 0; on_row && line < PQntuples(result.get()); ++line) {
         row found;
@@ -93,16 +106,30 @@ std::string run(void *handle, const std::string &sql, const row &values,
         }
         on_row(found);
     }
-    return "";
+    return {};
 }
 
 void disconnect(void *handle) {
     PQfinish(static_cast<PGconn *>(handle));
 }
 
+std::string set_version_statement(int version) {
+    return "COMMENT ON TABLE songs IS 'tavo, version " + std::to_string(version) + "'";
+}
+
 // An index entry takes a third of a page of 8 KiB.
-constexpr database_kind kPostgresql = {"BYTEA", "TIMESTAMPTZ", "JSON",    2600,
-                                       connect, run,           disconnect};
+constexpr database_kind kPostgresql = {
+    "BYTEA",
+    "TIMESTAMPTZ",
+    "JSON",
+    2600,
+    "SELECT coalesce(substring(obj_description(to_regclass('songs'), 'pg_class') FROM "
+    "'version ([0-9]+)'), '0')::int",
+    set_version_statement,
+    {"BEGIN", "SELECT pg_advisory_xact_lock(hashtext('tavo songs'))"},
+    connect,
+    run,
+    disconnect};
 
 }  // namespace
 

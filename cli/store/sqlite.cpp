@@ -1,25 +1,72 @@
 #include <sqlite3.h>
+#include <sys/stat.h>
 
 #include "cli/store/database.h"
+#include "cli/write/file_names.h"
 
 namespace {
 
 constexpr int kBusyMs = 2000;  // several processes may write to one file
 
-std::string open_file(const std::string &where, void **handle) {
-    sqlite3 *db = nullptr;
-    const int code = sqlite3_open(where.c_str(), &db);
-    const std::string error = code == SQLITE_OK ? "" : sqlite3_errmsg(db);
-    if (code != SQLITE_OK) {
-        sqlite3_close(db);
-        return error;
+bool is_permanent(int code) {
+    switch (code & 0xFF) {
+        case SQLITE_BUSY:
+        case SQLITE_LOCKED:
+        case SQLITE_CANTOPEN:
+        case SQLITE_IOERR:
+        case SQLITE_FULL:
+        case SQLITE_NOMEM:
+        case SQLITE_PROTOCOL:
+        case SQLITE_INTERRUPT:
+            return false;
+        default:
+            return true;
     }
-    sqlite3_busy_timeout(db, kBusyMs);
+}
+
+// Returns SQLite's code. The connection must be closed after a failure too.
+int connect(const std::string &name, int flags, sqlite3 **db) {
+    int code = sqlite3_open_v2(name.c_str(), db, flags, nullptr);
+    if (code != SQLITE_OK) return code;
+    sqlite3_busy_timeout(*db, kBusyMs);
     // A write-ahead log lets readers go on, and survives a kill at any moment.
-    sqlite3_exec(db, "PRAGMA journal_mode=WAL; PRAGMA synchronous=NORMAL", nullptr, nullptr,
-                 nullptr);
+    const char *first = (flags & SQLITE_OPEN_READONLY) != 0
+                            ? "SELECT count(*) FROM sqlite_master"
+                            : "PRAGMA journal_mode=WAL; PRAGMA synchronous=NORMAL";
+    code = sqlite3_exec(*db, first, nullptr, nullptr, nullptr);
+    // A file that cannot be written says so at the first statement that changes it.
+    return (flags & SQLITE_OPEN_READONLY) != 0 ? code : SQLITE_OK;
+}
+
+// In a folder that cannot be written SQLite reads a file with a write-ahead log only if it is told
+// that nothing changes; without the log's file there is nothing in it.
+bool has_empty_log(const std::string &location) {
+    struct stat info {};
+    return stat((location + "-wal").c_str(), &info) != 0 || info.st_size == 0;
+}
+
+failure open_file(const std::string &location, bool read_only, void **handle) {
+    sqlite3 *db = nullptr;
+    const int flags = read_only ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
+    int code = connect(location, flags, &db);
+    if (read_only && code == SQLITE_CANTOPEN && has_empty_log(location)) {
+        sqlite3_close(db);
+        const std::string host = location[0] == '/' ? "file://" : "file:";
+        code = connect(host + percent_encoded(location) + "?immutable=1", flags | SQLITE_OPEN_URI,
+                       &db);
+    }
+    const char *file = code == SQLITE_OK ? sqlite3_db_filename(db, "main") : nullptr;
+    failure failed;
+    if (code != SQLITE_OK) failed = {sqlite3_errmsg(db), is_permanent(code)};
+    if (code == SQLITE_OK && (file == nullptr || *file == '\0')) {
+        failed = {"'" + location + "' is not a file and would be lost at the end", true};
+    }
+    if (failed) {
+        sqlite3_close(db);
+        return failed;
+    }
     *handle = db;
-    return "";
+    return {};
 }
 
 void bind(sqlite3_stmt *statement, int index, const cell &value) {
@@ -53,8 +100,8 @@ cell column(sqlite3_stmt *statement, int index) {
     }
 }
 
-std::string run(void *handle, const std::string &sql, const row &values,
-                const std::function<void(const row &)> &on_row) {
+failure run(void *handle, const std::string &sql, const row &values,
+            const std::function<void(const row &)> &on_row) {
     auto *db = static_cast<sqlite3 *>(handle);
     sqlite3_stmt *statement = nullptr;
     int code = sqlite3_prepare_v2(db, sql.c_str(), -1, &statement, nullptr);
@@ -70,16 +117,30 @@ std::string run(void *handle, const std::string &sql, const row &values,
         }
         on_row(found);
     }
-    const std::string error = code == SQLITE_DONE ? "" : sqlite3_errmsg(db);
+    failure failed;
+    if (code != SQLITE_DONE) failed = {sqlite3_errmsg(db), is_permanent(code)};
     sqlite3_finalize(statement);
-    return error;
+    return failed;
 }
 
 void close_file(void *handle) {
     sqlite3_close(static_cast<sqlite3 *>(handle));
 }
 
-constexpr database_kind kSqlite = {"BLOB", "TEXT", "TEXT", 1U << 20, open_file, run, close_file};
+std::string set_version_statement(int version) {
+    return "PRAGMA user_version = " + std::to_string(version);
+}
+
+constexpr database_kind kSqlite = {"BLOB",
+                                   "TEXT",
+                                   "TEXT",
+                                   1U << 20,
+                                   "PRAGMA user_version",
+                                   set_version_statement,
+                                   {"BEGIN IMMEDIATE", nullptr},
+                                   open_file,
+                                   run,
+                                   close_file};
 
 }  // namespace
 

@@ -8,13 +8,16 @@
 #include <array>
 #include <cerrno>
 #include <ctime>
+#include <nlohmann/json.hpp>
 
+#include "cli/run/messages.h"
+#include "cli/run/stop.h"
+#include "cli/store/songs_table.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
 namespace {
 
-using nlohmann::json;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 
@@ -24,156 +27,138 @@ constexpr int64_t kFirstWaitMs = 500;  // doubled each time
 constexpr int64_t kLongestWaitMs = 30'000;
 constexpr int64_t kPageRows = 500;
 
-// A column beside the key and the file's state, and the key of the result that it holds.
-struct result_column {
-    const char *name;
-    const char *type;  // null: the database's type for JSON
-    const char *key;
-};
-constexpr result_column kResultColumns[] = {
-    {"status", "TEXT NOT NULL", "status"},
-    {"sentence", "TEXT", "error"},
-    {"sample_rate", "INTEGER", "sample_rate"},
-    {"channels", "INTEGER", "channels"},
-    {"duration_ms", "BIGINT", "duration_ms"},
-    {"hl_pos_ms", "INTEGER", "hl_pos_ms"},
-    {"hl_end_ms", "BIGINT", "hl_end_ms"},
-    {"hl_refined", "INTEGER", "hl_refined"},
-    {"bpm", "INTEGER", "bpm"},
-    {"beats_ms", nullptr, "beats_ms"},
-    {"cpu_ms", "BIGINT", "cpu_ms"},
-};
-constexpr const char *kKey = "path, mode, length_s, max_beats";
-
-std::string table_sql(const database_kind &kind) {
-    std::string sql = "CREATE TABLE IF NOT EXISTS songs (path " + std::string(kind.bytes_type) +
-                      " NOT NULL, mode TEXT NOT NULL, length_s INTEGER NOT NULL, max_beats INTEGER "
-                      "NOT NULL, size BIGINT NOT NULL, mtime_ns BIGINT NOT NULL";
-    for (const result_column &column : kResultColumns) {
-        sql += std::string(", ") + column.name + " " +
-               (column.type == nullptr ? kind.json_type : column.type);
-    }
-    return sql + ", version TEXT NOT NULL, host TEXT NOT NULL, finished " + kind.time_type +
-           " NOT NULL, PRIMARY KEY (" + kKey + "))";
-}
-
-// Inserts a row or replaces what is there under its key.
-std::string put_sql() {
-    std::vector<std::string> others = {"size", "mtime_ns"};
-    for (const result_column &column : kResultColumns) others.emplace_back(column.name);
-    others.insert(others.end(), {"version", "host", "finished"});
-    std::string names = kKey;
-    std::string values = "$1, $2, $3, $4";
-    std::string changes;
-    for (size_t i = 0; i < others.size(); ++i) {
-        names += ", " + others[i];
-        values += ", $" + std::to_string(i + 5);
-        changes += (i == 0 ? "" : ", ") + others[i] + " = excluded." + others[i];
-    }
-    return "INSERT INTO songs (" + names + ") VALUES (" + values + ") ON CONFLICT (" + kKey +
-           ") DO UPDATE SET " + changes;
-}
-
-cell cell_of(const json &result, const char *key) {
-    const auto found = result.find(key);
-    if (found == result.end()) return std::monostate();
-    if (found->is_boolean()) return int64_t{found->get<bool>() ? 1 : 0};
-    if (found->is_number_integer()) return found->get<int64_t>();
-    if (found->is_string()) return found->get<std::string>();
-    return found->dump();
-}
-
 // The key's cells, in its order.
-row key_of(const store &of, const std::string &path) {
-    return {bytes{path}, std::string(mode_word(of.mode)), int64_t{of.length_s},
-            int64_t{of.max_beats}};
+row key_of(const store &db, const std::string &path) {
+    return {bytes{path}, std::string(mode_word(db.opts.mode)), int64_t{db.opts.length_s},
+            int64_t{db.opts.max_beats}};
 }
 
-std::string now_text() {
-    const time_t now = time(nullptr);
-    tm parts{};
-    gmtime_r(&now, &parts);
-    std::array<char, 32> text{};
-    strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%SZ", &parts);
-    return text.data();
+failure run(const store &db, const std::string &sql, const row &values = {},
+            const std::function<void(const row &)> &on_row = nullptr) {
+    return db.kind->run(db.handle, sql, values, on_row);
 }
 
-std::string host_name() {
-    std::array<char, 256> name{};
-    gethostname(name.data(), name.size() - 1);
-    return as_utf8(name.data());
+void disconnect(store &db) {
+    if (db.handle != nullptr) db.kind->close(db.handle);
+    db.handle = nullptr;
 }
 
-row row_of(const store &of, const song_row &song) {
-    row out = key_of(of, song.path);
-    out.insert(out.end(), {song.file.size, song.file.mtime_ns});
-    for (const result_column &column : kResultColumns) {
-        out.push_back(cell_of(song.result, column.key));
-    }
-    out.insert(out.end(), {std::string(TAVO_VERSION), host_name(), now_text()});
-    return out;
+failure connect(store &db) {
+    if (db.handle != nullptr) return {};
+    failure failed = db.kind->open(db.location, db.opts.from_store, &db.handle);
+    if (failed) db.handle = nullptr;
+    return failed;
 }
 
-std::string run(const store &in, const std::string &sql, const row &values = {},
-                const std::function<void(const row &)> &on_row = nullptr) {
-    return in.kind->run(in.handle, sql, values, on_row);
+std::string public_text(const store &db, const failure &failed) {
+    return shown(without_credentials(failed.sentence, db.opts.store));
 }
 
-void disconnect(store &from) {
-    if (from.handle != nullptr) from.kind->close(from.handle);
-    from.handle = nullptr;
+failure give_up(store &db, const failure &failed) {
+    if (!failed) return {};
+    db.has_failed = true;
+    return {"the store is given up: " + public_text(db, failed) + "."};
 }
 
-std::string connect(store &to) {
-    if (to.handle != nullptr) return "";
-    const std::string error = to.kind->open(to.where, &to.handle);
-    if (!error.empty()) to.handle = nullptr;
-    return error;
-}
-
-// Runs the work until it succeeds, waiting longer after each failure, on a new connection each
-// time.
-std::string persist(store &to, int stop_fd, const std::function<std::string()> &work) {
+// Runs the work until it succeeds, on a new connection after each failure that may pass.
+failure persist(store &db, const std::function<failure()> &work) {
     const auto start = steady_clock::now();
     for (int64_t wait_ms = kFirstWaitMs;; wait_ms = std::min(2 * wait_ms, kLongestWaitMs)) {
-        std::string error = connect(to);
-        if (error.empty()) error = work();
-        if (error.empty()) return "";
-        disconnect(to);
-        const auto left = std::chrono::seconds(to.patience_s) - (steady_clock::now() - start);
+        failure failed = connect(db);
+        if (!failed) failed = work();
+        if (!failed) return {};
+        disconnect(db);
+        const auto left = std::chrono::seconds(db.opts.patience_s) - (steady_clock::now() - start);
         const int64_t left_ms = std::chrono::duration_cast<milliseconds>(left).count();
-        if (left_ms <= 0) return error;
+        if (failed.is_permanent || left_ms <= 0) return give_up(db, failed);
         wait_ms = std::min(wait_ms, left_ms);
         fprintf(stderr, "tavo: the store does not answer (%s); trying again in %.1f s.\n",
-                shown(error).c_str(), static_cast<double>(wait_ms) / 1000.0);
-        pollfd stop = {stop_fd, POLLIN, 0};
-        if (poll(&stop, 1, static_cast<int>(wait_ms)) > 0) return error;
+                public_text(db, failed).c_str(), static_cast<double>(wait_ms) / 1000.0);
+        pollfd stop = {stop_fd(), POLLIN, 0};
+        if (poll(&stop, 1, static_cast<int>(wait_ms)) > 0) return give_up(db, failed);
     }
 }
 
-std::string write_batch(const store &to) {
-    static const std::string sql = put_sql();
-    std::string error = run(to, "BEGIN");
-    for (size_t i = 0; error.empty() && i < to.batch.size(); ++i) {
-        error = run(to, sql, row_of(to, to.batch[i]));
-    }
-    return error.empty() ? run(to, "COMMIT") : error;
+failure read_version(store &db) {
+    db.version = 0;
+    return run(db, db.kind->version_query, {}, [&](const row &cells) {
+        if (const auto *number = std::get_if<int64_t>(&cells[0])) {
+            db.version = static_cast<int>(*number);
+        }
+    });
 }
 
-song_row song_of(const row &cells) {
-    song_row song;
-    song.path = std::get<bytes>(cells[0]).value;
-    song.result = json::object();
-    for (size_t i = 0; i < std::size(kResultColumns); ++i) {
-        const result_column &column = kResultColumns[i];
-        const cell &value = cells[i + 1];
-        if (const auto *number = std::get_if<int64_t>(&value)) {
-            song.result[column.key] = *number;
-        } else if (const auto *text = std::get_if<std::string>(&value)) {
-            song.result[column.key] = column.type == nullptr ? json::parse(*text) : json(*text);
+// Makes the table or adds the columns that it lacks, all or nothing.
+failure upgrade(store &db) {
+    std::vector<std::string> statements;
+    for (const char *begin : db.kind->begin_upgrade) {
+        if (begin != nullptr) statements.emplace_back(begin);
+    }
+    for (size_t i = 0; i < statements.size(); ++i) {
+        if (failure failed = run(db, statements[i])) return failed;
+    }
+    failure failed = read_version(db);  // another command may have done it meanwhile
+    if (!failed && db.version < kTableVersion) {
+        for (const std::string &statement : upgrade_statements(*db.kind)) {
+            if (!failed) failed = run(db, statement);
         }
     }
-    return song;
+    if (!failed) failed = run(db, "COMMIT");
+    if (failed) disconnect(db);  // which rolls back
+    return failed;
+}
+
+failure open_table(store &db) {
+    if (failure failed = connect(db)) return failed;
+    if (failure failed = read_version(db)) return failed;
+    if (db.version > kTableVersion) return {"it was written by a newer tavo", true};
+    return db.opts.from_store || db.version == kTableVersion ? failure() : upgrade(db);
+}
+
+failure write_batch(const store &db) {
+    static const std::string sql = put_statement();
+    if (failure failed = run(db, "BEGIN")) return failed;
+    for (const stored_song &song : db.batch) {
+        row cells = key_of(db, song.path);
+        cells.insert(cells.end(), {song.file.size, song.file.mtime_ns});
+        append_result_cells(cells, song.result);
+        if (failure failed = run(db, sql, cells)) return failed;
+    }
+    return run(db, "COMMIT");
+}
+
+failure commit_batch(store &db) {
+    if (db.batch.empty() || db.has_failed) return {};
+    if (failure failed = persist(db, [&] { return write_batch(db); })) return failed;
+    db.stored += static_cast<int64_t>(db.batch.size());
+    db.batch.clear();
+    return {};
+}
+
+failure read_page(store &db) {
+    return persist(db, [&] {
+        db.page.clear();
+        row values = key_of(db, db.last_path);
+        values.insert(values.end(), {std::string(db.opts.failed ? "failed" : "ok"), kPageRows});
+        return run(db, page_query(db.version), values, [&](const row &cells) {
+            db.page.emplace_back();
+            stored_song &song = db.page.back();
+            song.damage = read_result_cells(cells, mode_word(db.opts.mode), song.path, song.result);
+        });
+    });
+}
+
+std::string summary_text(const store &db) {
+    std::string text = std::to_string(db.stored) + " stored";
+    if (db.known > 0) text += ", " + std::to_string(db.known) + " known already";
+    if (db.known_failed > 0) {
+        text += " (" + std::to_string(db.known_failed) + " failed; --retry-failed)";
+    }
+    if (!db.batch.empty()) {
+        text += "; " + count_text(db.batch.size(), "result") +
+                " could not be stored and went to standard output";
+    }
+    return "tavo: " + text + ".\n";
 }
 
 }  // namespace
@@ -186,73 +171,84 @@ int read_file_state(const std::string &path, file_state &state) {
     return 0;
 }
 
-std::string open_store(store &to, const std::string &url, const options &opts) {
-    std::string error;
-    to.kind = find_database(url, to.where, error);
-    if (to.kind == nullptr) return error;
-    to.mode = opts.mode;
-    to.length_s = opts.length_s;
-    to.max_beats = opts.max_beats;
-    to.patience_s = opts.patience_s;
-    error = connect(to);
-    if (error.empty()) error = run(to, table_sql(*to.kind));
-    return error.empty() ? "" : "The store cannot be used: " + shown(error) + ".";
+failure open_store(store &db, const options &opts) {
+    if (opts.store.empty()) return {};
+    db.opts = opts;
+    if (failure failed = find_database(opts.store, &db.kind, db.location)) {
+        db.kind = nullptr;
+        return failed;
+    }
+    const failure failed = open_table(db);
+    if (!failed) return {};
+    const std::string text = public_text(db, failed);
+    disconnect(db);
+    db.kind = nullptr;
+    return {"The store cannot be used: " + text + "."};
 }
 
-std::string find_song(store &in, const std::string &path, const file_state &file, int stop_fd,
-                      known_as &found) {
-    return persist(in, stop_fd, [&] {
-        found = known_as::unknown;
-        row values = key_of(in, path);
+failure find_song(store &db, const std::string &path, file_state &file, bool &is_new) {
+    is_new = true;
+    if (db.kind == nullptr || db.has_failed) return {};
+    if (read_file_state(path, file) != 0 || db.opts.redo) return {};
+    std::string status;
+    failure failed = persist(db, [&] {
+        row values = key_of(db, path);
         values.insert(values.end(), {file.size, file.mtime_ns});
-        return run(in,
-                   "SELECT status FROM songs WHERE path = $1 AND mode = $2 AND length_s = $3 AND "
-                   "max_beats = $4 AND size = $5 AND mtime_ns = $6",
-                   values, [&](const row &cells) {
-                       found = std::get<std::string>(cells[0]) == "ok" ? known_as::ok
-                                                                       : known_as::failed;
-                   });
+        return run(db, kStatusQuery, values, [&](const row &cells) {
+            const auto *text = std::get_if<std::string>(&cells[0]);
+            status = text != nullptr ? *text : "damaged";
+        });
     });
+    const bool is_failed = status == "failed";
+    if (status.empty() || status == "damaged" || (is_failed && db.opts.retry_failed)) return failed;
+    is_new = false;
+    ++db.known;
+    db.known_failed += is_failed ? 1 : 0;
+    return failed;
 }
 
-std::string add_song(store &to, song_row &&song, int stop_fd) {
-    if (to.batch.empty()) to.batch_since = steady_clock::now();
-    to.batch.push_back(std::move(song));
-    const bool full = to.batch.size() >= kBatchRows || batch_timeout_ms(to) == 0;
-    return full ? commit_batch(to, stop_fd) : "";
+failure add_song(store &db, stored_song &&song) {
+    if (db.kind == nullptr || song.result.empty()) return {};
+    if (song.path.size() > db.kind->longest_path) {
+        return {shown(song.path) + ": the name is too long for the store."};
+    }
+    if (db.batch.empty()) db.batch_since = steady_clock::now();
+    db.batch.push_back(std::move(song));
+    return db.batch.size() >= kBatchRows ? commit_batch(db) : commit_old_batch(db);
 }
 
-std::string commit_batch(store &to, int stop_fd) {
-    if (to.batch.empty()) return "";
-    const std::string error = persist(to, stop_fd, [&] { return write_batch(to); });
-    if (!error.empty()) return error;
-    to.stored += static_cast<int64_t>(to.batch.size());
-    to.batch.clear();
-    return "";
+failure commit_old_batch(store &db) {
+    return batch_timeout_ms(db) == 0 ? commit_batch(db) : failure();
 }
 
-int batch_timeout_ms(const store &of) {
-    if (of.batch.empty()) return -1;
-    const auto left = kBatchAge - (steady_clock::now() - of.batch_since);
+int batch_timeout_ms(const store &db) {
+    if (db.batch.empty() || db.has_failed) return -1;
+    const auto left = kBatchAge - (steady_clock::now() - db.batch_since);
     return static_cast<int>(std::max<int64_t>(std::chrono::ceil<milliseconds>(left).count(), 0));
 }
 
-std::string read_page(store &from, const std::string &after, std::vector<song_row> &page) {
-    std::string columns = "path";
-    for (const result_column &column : kResultColumns) columns += std::string(", ") + column.name;
-    row values = key_of(from, after);
-    values.emplace_back(kPageRows);
-    return run(from,
-               "SELECT " + columns +
-                   " FROM songs WHERE path > $1 AND mode = $2 AND length_s = $3 AND max_beats = $4 "
-                   "AND status = 'ok' ORDER BY path LIMIT $5",
-               values, [&](const row &cells) {
-                   page.push_back(song_of(cells));
-                   page.back().result["mode"] = mode_word(from.mode);
-               });
+failure read_next(store &db, stored_song &song, bool &found) {
+    found = false;
+    if (db.page.empty()) {
+        if (failure failed = read_page(db)) return failed;
+        if (db.page.empty()) return {};
+        db.last_path = db.page.back().path;
+    }
+    song = std::move(db.page.front());
+    db.page.pop_front();
+    found = true;
+    return {};
 }
 
-void close_store(store &which) {
-    disconnect(which);
-    which.batch.clear();
+failure close_store(store &db, std::string &summary) {
+    if (db.kind == nullptr) return {};
+    failure failed = commit_batch(db);
+    for (const stored_song &song : db.batch) {
+        write_all(STDOUT_FILENO, song.result.data(), song.result.size());
+    }
+    if ((!db.opts.quiet && !db.opts.from_store) || !db.batch.empty()) summary = summary_text(db);
+    disconnect(db);
+    db.batch.clear();
+    db.kind = nullptr;
+    return failed;
 }

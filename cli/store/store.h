@@ -2,20 +2,22 @@
 //
 // In: results as JSON (format.h), in the command's own process. Out: one row per song and
 // parameters, in batches of one transaction each: a kill at any moment loses at most the open batch
-// and leaves no row half written. Called by workers.h. Several commands may share one store.
+// and leaves no row half written. Called by analyse_inputs.cpp. Several commands may share one
+// store. Without --store every function does nothing.
 #ifndef TAVO_CLI_STORE_STORE_H
 #define TAVO_CLI_STORE_STORE_H
 
 #include <chrono>
 #include <cstdint>
-#include <nlohmann/json.hpp>
+#include <deque>
 #include <string>
 #include <vector>
 
+#include "cli/failure.h"
 #include "cli/options.h"
 #include "cli/store/database.h"
 
-// What tells whether a file is the one that was analysed.
+// Distinguishes a file from a later one of the same name.
 struct file_state {
     int64_t size = 0;      // bytes
     int64_t mtime_ns = 0;  // last change, since 1970
@@ -24,47 +26,54 @@ struct file_state {
 // Returns 0 or errno.
 int read_file_state(const std::string &path, file_state &state);
 
-struct song_row {
-    std::string path;  // as it was named, any bytes
-    file_state file;
-    nlohmann::json result;  // the object of --format json
+struct stored_song {
+    std::string path;    // any bytes
+    file_state file;     // before the analysis
+    std::string result;  // the object of --format json
+    failure damage;      // of a row read: a column that no tavo wrote
 };
 
 struct store {
-    const database_kind *kind = nullptr;
-    std::string where;
-    void *handle = nullptr;  // null while the database is away
-    int32_t mode = 0;        // the parameters of every row written and looked up
-    int32_t length_s = 0;
-    int32_t max_beats = 0;
-    int32_t patience_s = 0;       // how long a database that is away is asked again
-    std::vector<song_row> batch;  // not committed yet
+    options opts;
+    const database_kind *kind = nullptr;  // null without --store
+    std::string location;
+    void *handle = nullptr;          // null while there is no connection
+    int version = 0;                 // of the table, as it was found
+    bool has_failed = false;         // given up; the run ends
+    std::vector<stored_song> batch;  // not committed yet
     std::chrono::steady_clock::time_point batch_since;
-    int64_t stored = 0;  // rows committed
+    std::deque<stored_song> page;  // with --from-store: rows read and not yet returned
+    std::string last_path;         // of the page
+    int64_t stored = 0;            // rows committed
+    int64_t known = 0;             // songs left out because they are stored
+    int64_t known_failed = 0;      // of these, those that are stored as failed
 };
 
-enum class known_as { unknown, ok, failed };
+// These try again while the database does not answer, waiting longer each time, for --patience;
+// each wait is announced on standard error and ends at a stop. After a failure the store is given
+// up.
 
-// These return an empty string or a sentence. Those that write try again, waiting longer each time,
-// for patience_s; each wait is announced on standard error and ends when stop_fd becomes readable.
+// Connects and, unless the store is only read, makes or upgrades the table. Does not try again.
+failure open_store(store &db, const options &opts);
 
-// Connects and makes the table if it is missing. Does not try again.
-std::string open_store(store &to, const std::string &url, const options &opts);
+// True in is_new if the song is to be analysed: it is not stored for these parameters as it is now,
+// or the options ask for it again.
+failure find_song(store &db, const std::string &path, file_state &file, bool &is_new);
 
-// Whether the file is stored for these parameters as it is now.
-std::string find_song(store &in, const std::string &path, const file_state &file, int stop_fd,
-                      known_as &found);
+// Adds a result to the batch, which is committed once it is full or old. After the store was given
+// up, results are kept for close_store.
+failure add_song(store &db, stored_song &&song);
 
-// Adds a row to the batch, which is committed when it is full or old.
-std::string add_song(store &to, song_row &&song, int stop_fd);
-std::string commit_batch(store &to, int stop_fd);
+// Commits a batch that is old.
+failure commit_old_batch(store &db);
+int batch_timeout_ms(const store &db);  // until then, for poll; -1 for never
 
-// Milliseconds until the batch is old; -1 without one. For poll.
-int batch_timeout_ms(const store &of);
+// With --from-store: the next row of these parameters, in the order of the paths. found is false
+// after the last one.
+failure read_next(store &db, stored_song &song, bool &found);
 
-// The next rows with these parameters and a result, in the order of the paths, after the given one.
-std::string read_page(store &from, const std::string &after, std::vector<song_row> &page);
-
-void close_store(store &which);  // the open batch is dropped; harmless when called twice
+// Commits what is left and closes. Results that could not be stored go to standard output as JSON.
+// summary is what to tell the user.
+failure close_store(store &db, std::string &summary);
 
 #endif

@@ -1,6 +1,6 @@
 // Marker files: what an editor imports, one file beside each song or in --output-dir.
 //
-// In: a record and the options. Out: the file's content, for worker.cpp to write.
+// In: a record and the options. Out: the file's content, for worker_process.cpp to write.
 #ifndef TAVO_CLI_WRITE_MARKERS_H
 #define TAVO_CLI_WRITE_MARKERS_H
 

@@ -10,6 +10,7 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "cli/run/temporary_files.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
@@ -72,6 +73,7 @@ std::string begin_output(output_file &file, const std::string &target) {
         file.temporary.clear();
         return write_error(target, code);
     }
+    note_temporary_file(file.temporary);
     const mode_t mask = umask(0);
     umask(mask);
     fchmod(file.fd, 0666 & ~mask);  // mkostemp's own permissions let nobody else read
@@ -96,7 +98,10 @@ std::string commit_output(output_file &file, bool force) {
     } else if (code == 0) {
         code = rename_without_overwriting(file.temporary, file.target);
     }
-    if (code == 0) file.temporary.clear();
+    if (code == 0) {
+        forget_temporary_file(file.temporary);
+        file.temporary.clear();
+    }
     abandon_output(file);
     if (code == EEXIST && !force) return already_there(file.target);
     return code == 0 ? "" : write_error(file.target, code);
@@ -105,7 +110,10 @@ std::string commit_output(output_file &file, bool force) {
 void abandon_output(output_file &file) {
     if (file.fd >= 0) close(file.fd);
     file.fd = -1;
-    if (!file.temporary.empty()) unlink(file.temporary.c_str());
+    if (!file.temporary.empty()) {
+        unlink(file.temporary.c_str());
+        forget_temporary_file(file.temporary);
+    }
     file.temporary.clear();
 }
 

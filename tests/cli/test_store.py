@@ -5,7 +5,7 @@ import random
 import sqlite3
 import time
 
-from command_case import Case, send, short_song
+from command_case import AS_ORDINARY_USER, Case, send, short_song
 
 KEYS = ("status", "sample_rate", "channels", "duration_ms", "hl_pos_ms", "bpm", "beats_ms")
 STORE = ("--store", "x.db")
@@ -42,13 +42,14 @@ class Store(Case):
             self.assertEqual([row[key] for key in ("size", "mtime_ns", "mode", "length_s", "max_beats")],
                              [state.st_size, state.st_mtime_ns, "both", 5, 0])
         # Known, the failed one too.
-        self.run_tavo("--store", "sqlite:x.db", "--format", "json", *words, said=b"0 stored", printed=b"")
+        self.run_tavo("--store", "sqlite:x.db", "--format", "json", *words, status=1,
+                      said=b"0 stored, 3 known already (1 failed; --retry-failed)", printed=b"")
 
     def test_what_is_analysed_again(self):
         self.put("a.wav")
         self.put("bad.wav", content=b"RIFF" + bytes(60))
-        for words, status, stored in (("", 1, 2), ("", 0, 0), ("--retry-failed", 1, 1), ("--redo", 1, 2),
-                                      ("--mode beats", 1, 2), ("--max-beats 2", 1, 2), ("touched", 0, 1)):
+        for words, status, stored in (("", 1, 2), ("", 1, 0), ("--retry-failed", 1, 1), ("--redo", 1, 2),
+                                      ("--mode beats", 1, 2), ("--max-beats 2", 1, 2), ("touched", 1, 1)):
             if words == "touched":
                 os.utime(self.folder / "a.wav", (1, 1))
                 words = ""
@@ -87,9 +88,13 @@ class Store(Case):
         self.assertIn(b"1 result could not be stored", done.stderr)
         (saved,) = self.objects(done.stdout)
         self.assert_same(self.rows()[b"a.wav"], saved)
-        for url, words in (("x.txt", b"sqlite:FILE"), ("none/x.db", b"cannot be used"),
-                           ("postgresql://127.0.0.1:9/x", b"Connection refused")):
-            self.run_tavo("--store", url, "a.wav", status=1, said=words)
+        self.put("text.db", b"no database, but as long as one\n" * 40)
+        for url, words in (("x.txt", b"sqlite:FILE"), ("none/x.db", b"cannot be used"), ("sqlite:", b"name of a file"),
+                           ("sqlite::memory:", b"is not a file"), ("text.db", b"not a database"),
+                           ("postgresql://127.0.0.1:9/x", b"Connection refused"),
+                           ("postgresql://me:se%40c/r@et@127.0.0.1:9/x", b"cannot be used")):
+            done = self.run_tavo("--store", url, "a.wav", status=1, said=words)
+            self.assertNotRegex(done.stderr, rb"\bme\b|\bse\b|\bc\b|\br\b|\bet\b|trying again")
 
     def test_written_out_again(self):
         names = self.put_songs(3)
@@ -102,6 +107,53 @@ class Store(Case):
         start, end = (expected[1][key] / 1000 for key in ("hl_pos_ms", "hl_end_ms"))
         self.assertIn(f"{start:.6f}\t{end:.6f}\thighlight", (self.folder / "song 1.wav.labels.txt").read_text())
         self.run_tavo(*STORE, "--from-store", status=2)
+        # The store and its folder need not be writable.
+        (self.folder / "x.db").chmod(0o444)
+        self.folder.chmod(0o555)
+        self.addCleanup(self.folder.chmod, 0o700)
+        self.assertEqual(self.run_json(*STORE, "--from-store", "--length", "5", before=AS_ORDINARY_USER), expected)
+
+    def test_markers_of_a_run_that_was_killed(self):
+        """Their songs were analysed, and their rows lost."""
+        names = self.put_songs(3)
+        words = (*STORE, "--format", "labels", *names)
+        self.run_tavo(*words)
+        for path in self.folder.glob("x.db*"):
+            path.unlink()
+        self.put("song 1.wav.labels.txt", b"of somebody else\n")
+        for stored, known in ((2, 0), (0, 2)):  # the third is no failed song: it is tried again
+            self.run_tavo(*words, status=1, said=b"song 1.wav: The file song 1.wav.labels.txt exists already")
+            self.assertEqual([row["status"] for row in self.rows().values()], ["ok"] * 2)
+        self.run_tavo(*words, "--force", said=b"1 stored, 2 known")
+
+    def test_a_store_of_the_first_version(self):
+        """Of a tavo before offset_ms and decoder; with rows that were damaged since."""
+        self.put("a.wav")
+        self.put("bad.wav", content=b"RIFF" + bytes(60))
+        self.run_tavo(*STORE, "a.wav", "bad.wav", status=1)
+        (expected,) = self.run_json("a.wav")
+        with sqlite3.connect(self.folder / "x.db", isolation_level=None) as db:
+            for name, column, value in (("deep", "beats_ms", "[" * 10**6), ("blob", "hl_pos_ms", b"x"),
+                                        ("word", "bpm", "many")):
+                db.execute("CREATE TEMP TABLE one AS SELECT * FROM songs WHERE path = ?", (b"a.wav",))
+                db.execute(f"UPDATE one SET path = ?, {column} = ?", (name.encode(), value))
+                db.execute("INSERT INTO songs SELECT * FROM one")
+                db.execute("DROP TABLE one")
+            for column in ("offset_ms", "decoder"):
+                db.execute(f"ALTER TABLE songs DROP COLUMN {column}")
+            db.execute("PRAGMA user_version = 0")
+        done = self.run_tavo(*STORE, "--from-store", "--format", "json", status=1)
+        damaged = [(b"blob", b"hl_pos_ms"), (b"deep", b"beats_ms"), (b"word", b"bpm")]
+        self.assertEqual(done.stderr, b"".join(b"tavo: %s: Its row in the store is damaged: %s cannot be read.\n" % pair
+                                               for pair in damaged))
+        self.assertEqual(self.objects(done.stdout)[0]["beats_ms"], expected["beats_ms"])
+        sentence = self.rows()[b"bad.wav"]["sentence"]
+        self.run_tavo(*STORE, "--from-store", "--failed", printed=f"bad.wav: {sentence}\n".encode())
+        self.run_tavo(*STORE, "a.wav", said=b"1 known")  # which brings it up to date
+        with sqlite3.connect(self.folder / "x.db") as db:
+            self.assertEqual(db.execute("SELECT count(offset_ms), count(decoder) FROM songs").fetchone(), (0, 0))
+            db.execute("PRAGMA user_version = 99")
+        self.run_tavo(*STORE, "a.wav", status=1, said=b"written by a newer tavo")
 
     def test_shards(self):
         names = self.put_songs(12)
@@ -121,20 +173,3 @@ class Store(Case):
                 self.assertEqual(share("auto", **engine), expected)
         for wrong in ("0/3", "4/3", "1", "a/3", "1/3x", "auto"):
             self.run_tavo("--shard", wrong, names[0], status=2)
-
-    def test_forecast(self):
-        names = self.put_songs(40)
-        for i, name in enumerate(names):
-            os.truncate(self.folder / name, short_song().stat().st_size + i * 1000)  # behind the sound
-        self.put("bad.mp3", content=bytes(5000))
-        self.put("list", "\n".join([*names, "bad.mp3", "missing.wav"]).encode())
-        words = "--forecast list --files 1000000 --cores 4 --bandwidth 10 --sample".split()
-        whole = self.run_tavo(*words, "1000").stdout.decode()
-        mean_mb = sum(os.stat(self.folder / name).st_size for name in [*names, "bad.mp3"]) / 41 / 1e6
-        for said in ("41 files, 41 analysed", "1 listed and not there", f"{mean_mb:.3f} ± 0.000 MB",
-                     f"{mean_mb:.3f} TB", f"{100 / 41:.3f} ± 0.000 %"):
-            self.assertIn(said, whole)
-        part = self.run_tavo(*words, "12", *STORE).stdout.decode()
-        mean, width = (float(word) for word in part.split("read ")[1].split(" MB")[0].split("±"))
-        self.assertTrue(abs(mean - mean_mb) < 3 * width, part)
-        self.assertLess(len(self.rows()), 41)

@@ -108,6 +108,22 @@ class Workers(Case):
                 self.assertRegex(err, rb"stopped; %d of [134] files? done" % len(finished))
         self.assert_only("a.wav", "long.wav", "other.wav")
 
+    def test_a_worker_that_hangs(self):
+        """It is ended after a second of a stop, or --timeout; what it was writing is removed."""
+        for words, number, sentence in (("", signal.SIGTERM, b"stopped; 0 of 1 file"),
+                                        ("--timeout 1", None, b"long.wav: The analysis took more than 1 s")):
+            process = self.start("--click", "c.wav", *words.split(), "long.wav")
+            worker = self.worker_with(process, "long.wav")
+            os.kill(worker, signal.SIGSTOP)
+            self.assertTrue(list(self.folder.glob(".tavo-*")))
+            if number:
+                process.send_signal(number)
+            _, err = process.communicate(timeout=20)
+            self.assertEqual(process.returncode, 128 + number if number else 1)
+            self.assertIn(sentence, err)
+            self.assertFalse(os.path.exists(f"/proc/{worker}"))
+            self.assert_only("a.wav", "long.wav", "other.wav")
+
     def test_a_list_that_is_being_read(self):
         """A stop and a reader gone end the wait for the next name."""
         for end, status in ((lambda process: process.send_signal(signal.SIGINT), 128 + signal.SIGINT),

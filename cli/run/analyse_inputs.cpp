@@ -1,0 +1,188 @@
+#include "cli/run/analyse_inputs.h"
+
+#include <poll.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <deque>
+#include <vector>
+
+#include "cli/input/inputs.h"
+#include "cli/run/ordered_output.h"
+#include "cli/run/process_pool.h"
+#include "cli/run/stop.h"
+#include "cli/run/worker_process.h"
+#include "cli/store/store.h"
+
+namespace {
+
+constexpr size_t kMostAhead = 10'000;   // inputs found before they can be analysed
+constexpr size_t kFoundAtOnce = 64;     // between two looks at the workers
+constexpr size_t kMostWaiting = 1'000;  // results held until an earlier one is there
+
+struct run_state {
+    const options &opts;
+    input_supply supply;
+    supply_state found = supply_state::ready;  // by the last search
+    std::deque<job> queue = {};
+    size_t count = 0;  // inputs found so far
+    ordered_output output = {};
+    store db = {};
+    process_pool pool;
+    bool is_ending = false;  // no more jobs are sent
+    bool has_error = false;  // other than a failed file
+};
+
+// Writes the line for a failure that concerns no single file. True if there was one.
+bool report(run_state &state, const failure &failed) {
+    if (!failed) return false;
+    state.has_error = true;
+    write_message(state.output, "tavo: " + failed.sentence + "\n");
+    return true;
+}
+
+void accept_result(run_state &state, job &&done, reply &&answer) {
+    const size_t index = done.asked.index;
+    if (done.asked.stored.empty()) {
+        report(state, add_song(state.db, {done.asked.path, done.file, std::move(answer.json), {}}));
+    }
+    accept_reply(state.output, index, std::move(answer));
+}
+
+void fail_input(run_state &state, job &&failed, const std::string &error) {
+    const record result = failed_record(failed.asked.path, state.opts.mode, error);
+    accept_result(state, std::move(failed), make_reply(result, state.opts));
+}
+
+bool may_search(const run_state &state) {
+    return !state.is_ending && state.found != supply_state::ended &&
+           state.queue.size() < kMostAhead;
+}
+
+// The next input of the command line, or of the store.
+supply_state find_next(run_state &state, job &next) {
+    if (state.opts.from_store) {
+        stored_song song;
+        bool found = false;
+        report(state, read_next(state.db, song, found));
+        next.asked.path = song.path;
+        next.asked.stored = song.result;
+        next.refusal = song.damage;
+        return found ? supply_state::ready : supply_state::ended;
+    }
+    input entry;
+    const supply_state found = next_input(state.supply, entry);
+    next.asked.path = std::move(entry.path);
+    next.refusal = std::move(entry.refusal);
+    return found;
+}
+
+// True if the input belongs to this command's share and is not stored yet.
+bool is_wanted(run_state &state, job &next) {
+    if (!in_shard(state.opts.share, next.asked.path)) return false;
+    if (state.opts.from_store || next.refusal) return true;
+    bool is_new = true;
+    report(state, find_song(state.db, next.asked.path, next.file, is_new));
+    return is_new;
+}
+
+// Finds a few more inputs, unless enough are waiting.
+void search_inputs(run_state &state) {
+    for (size_t i = 0; i < kFoundAtOnce && may_search(state); ++i) {
+        job next;
+        state.found = find_next(state, next);
+        if (state.found == supply_state::ended) set_total(state.output, state.count);
+        if (state.found != supply_state::ready) break;
+        if (!is_wanted(state, next)) continue;
+        next.asked.index = state.count++;
+        state.queue.push_back(std::move(next));
+    }
+    if (!state.opts.quiet) write_message(state.output, state.supply.notes);
+    state.supply.notes.clear();
+}
+
+// Gives every idle worker a job.
+void send_jobs(run_state &state) {
+    while (!state.is_ending && !state.queue.empty()) {
+        job &first = state.queue.front();
+        if (first.asked.index >= state.output.next + kMostWaiting) return;
+        failure failed = first.refusal;
+        worker_process *worker = failed ? nullptr : find_idle(state.pool, failed);
+        if (worker == nullptr && !failed) return;
+        job next = std::move(first);
+        state.queue.pop_front();
+        if (failed) {
+            fail_input(state, std::move(next), failed.sentence);
+        } else {
+            send_job(state.pool, *worker, std::move(next));
+        }
+    }
+}
+
+// The shortest of several times for poll, where -1 is forever.
+int shortest_wait(std::initializer_list<int> waits) {
+    int shortest = -1;
+    for (const int wait : waits) {
+        if (wait >= 0 && (shortest < 0 || wait < shortest)) shortest = wait;
+    }
+    return shortest;
+}
+
+// Waits for what comes next: replies, names in a list, a stop, the end of the results' reader.
+// Returns at once while there are inputs to be found.
+void wait_and_serve(run_state &state) {
+    const bool is_listening = may_search(state) && state.found == supply_state::waiting;
+    const bool is_searching = may_search(state) && !is_listening;
+    std::vector<pollfd> watched;
+    watched.push_back({state.is_ending ? -1 : stop_fd(), POLLIN, 0});
+    watched.push_back({state.output.to_pipe && !state.is_ending ? STDOUT_FILENO : -1, 0, 0});
+    watched.push_back({is_listening ? supply_fd(state.supply) : -1, POLLIN, 0});
+    const size_t first_worker = watched.size();
+    append_watched(state.pool, watched);
+    const int timeout =
+        is_searching ? 0
+                     : shortest_wait({redraw_timeout_ms(state.output), batch_timeout_ms(state.db),
+                                      deadline_timeout_ms(state.pool)});
+    if (poll(watched.data(), watched.size(), timeout) >= 0) {
+        if ((watched[1].revents & POLLERR) != 0) note_reader_gone(state.output);
+        serve_workers(state.pool, watched.data() + first_worker);
+    }
+    report(state, commit_old_batch(state.db));
+    redraw(state.output);
+}
+
+// Ends the workers once nothing is left to do, or at a stop.
+void end_if_done(run_state &state) {
+    if (state.is_ending) return;
+    const bool is_stop = stop_requested() || output_failed(state.output) || state.db.has_failed;
+    const bool is_exhausted = state.found == supply_state::ended && state.queue.empty();
+    if (!is_stop && (!is_exhausted || has_busy(state.pool))) return;
+    state.is_ending = true;
+    end_workers(state.pool, is_stop);
+}
+
+}  // namespace
+
+int analyse_inputs(const options &opts) {
+    run_state state{opts, {opts}, supply_state::ready, {}, 0, {}, {}, {opts, {}, {}}};
+    state.pool.on_reply = [&](job &&done, reply &&answer) {
+        accept_result(state, std::move(done), std::move(answer));
+    };
+    state.pool.on_bad_end = [&](const std::string &ending) {
+        report(state, {"an analysis process without a file was ended " + ending + "."});
+    };
+    if (report(state, open_store(state.db, opts))) return kExitFailed;
+    if (report(state, start_output(state.output, opts))) return kExitFailed;
+    while (true) {
+        search_inputs(state);
+        send_jobs(state);
+        end_if_done(state);
+        if (state.is_ending && state.pool.processes.empty()) break;
+        wait_and_serve(state);
+    }
+    const bool has_known_failure = state.db.known_failed > 0;
+    std::string summary;
+    report(state, close_store(state.db, summary));
+    write_message(state.output, summary);
+    return finish_output(state.output, opts, state.has_error || has_known_failure);
+}

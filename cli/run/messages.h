@@ -1,0 +1,38 @@
+// What the command and a worker process send each other: a request through one pipe, its reply
+// through another. A worker has at most one request.
+#ifndef TAVO_CLI_RUN_MESSAGES_H
+#define TAVO_CLI_RUN_MESSAGES_H
+
+#include <cstdint>
+#include <string>
+
+#include "cli/run/record.h"
+
+struct request {
+    uint64_t index = 0;  // of the input
+    std::string path;
+    std::string stored;  // its result as JSON, if the store had it; empty otherwise
+};
+
+struct reply {
+    outcome status = outcome::failed;
+    std::string result;   // for standard output
+    std::string message;  // for standard error
+    std::string json;     // the result for the store, if it belongs there
+    std::string row;      // of the report's index, if there is one
+};
+
+std::string encode(const request &message);
+std::string encode(const reply &message);
+
+// Decodes the message at the start of received and removes it. False if it is not complete yet.
+bool decode(std::string &received, request &message);
+bool decode(std::string &received, reply &message);
+
+// Sent when there is not enough memory to encode a reply: decodes to a failed one without texts.
+extern const std::string kEmptyReply;
+
+// Writes all of it, going on after interruptions. Returns 0 or errno.
+int write_all(int fd, const char *data, size_t size);
+
+#endif

@@ -1,0 +1,75 @@
+#include "cli/run/temporary_files.h"
+
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include <climits>
+#include <csignal>
+#include <cstring>
+
+#include "cli/options.h"
+
+namespace {
+
+constexpr size_t kMostFiles = 4;  // a click track, a page, markers, a clip
+
+}  // namespace
+
+struct temporary_files {
+    char paths[kMostFiles][PATH_MAX];  // an empty one is free
+};
+
+namespace {
+
+temporary_files *own_files = nullptr;
+
+void on_signal(int /*number*/) {
+    remove_files(own_files);
+    _exit(kExitFailed);
+}
+
+}  // namespace
+
+temporary_files *make_temporary_files() {
+    void *memory = mmap(nullptr, sizeof(temporary_files), PROT_READ | PROT_WRITE,
+                        MAP_SHARED | MAP_ANONYMOUS, -1, 0);
+    return memory == MAP_FAILED ? nullptr : static_cast<temporary_files *>(memory);
+}
+
+void release_temporary_files(temporary_files *files) {
+    if (files != nullptr) munmap(files, sizeof *files);
+}
+
+int remove_files_at_signal(temporary_files *files) {
+    own_files = files;
+    struct sigaction action {};
+    action.sa_handler = on_signal;
+    sigemptyset(&action.sa_mask);
+    sigaction(SIGALRM, &action, nullptr);
+    return SIGALRM;
+}
+
+void note_temporary_file(const std::string &path) {
+    if (own_files == nullptr || path.size() >= PATH_MAX) return;
+    for (auto &slot : own_files->paths) {
+        if (slot[0] != '\0') continue;
+        // The first character last: a path that is half written is a free one.
+        memcpy(slot + 1, path.c_str() + 1, path.size());
+        slot[0] = path[0];
+        return;
+    }
+}
+
+void forget_temporary_file(const std::string &path) {
+    if (own_files == nullptr) return;
+    for (auto &slot : own_files->paths) {
+        if (path == slot) slot[0] = '\0';
+    }
+}
+
+void remove_files(temporary_files *files) {
+    for (auto &slot : files->paths) {
+        if (slot[0] != '\0') unlink(slot);
+        slot[0] = '\0';
+    }
+}
