@@ -3,6 +3,7 @@ import array
 import json
 import os
 import pathlib
+import platform
 import re
 import subprocess
 import tempfile
@@ -11,6 +12,7 @@ import unittest
 MAKE_SONG, BUILD, CMAKE, GENERATOR, CC, CXX, VERSION, LIBDIR = (
     os.environ[name] for name in "MAKE_SONG BUILD CMAKE GENERATOR CC CXX VERSION LIBDIR".split())
 SONAME = "libtavo.so." + VERSION.split(".", maxsplit=1)[0]
+ROOT = pathlib.Path(__file__).parents[2]
 STRICT = ["-Wall", "-Wextra", "-Wpedantic", "-Werror"]
 
 
@@ -88,6 +90,7 @@ class Installed(unittest.TestCase):
         self.assertEqual(run(self.tavo, "--version"), f"tavo {VERSION}\n")
         self.assertEqual(self.pkg_config("--modversion"), [VERSION])
         self.assertIn("-pthread", self.pkg_config("--libs"))
+        self.assertIn("-lwexaaudio", self.pkg_config("--libs", "--static"))
         self.assertIn(f"soname: [{SONAME}]", run("readelf", "-d", self.lib / "libtavo.so"))
         self.assertEqual(os.readlink(self.lib / "libtavo.so"), SONAME)
 
@@ -101,6 +104,47 @@ class Installed(unittest.TestCase):
             self.assertEqual(pathlib.Path(found[name]).resolve().parent, folder.resolve(), name)
         words = [self.tavo, "--store", "postgresql://127.0.0.1:9/x", self.song]  # by a module that is loaded then
         self.assertIn("refused", subprocess.run(words, text=True, capture_output=True, env=environment).stderr)
+
+    def test_hardened(self):
+        for path, also in ((self.lib / "libtavo.so", ["Fortify Source functions"]),
+                           (self.lib / "tavo/libwexaaudio.so", ["Fortify Source functions"]),
+                           (self.lib / "tavo/libwexaaudio_av.so", []), (self.lib / "tavo/libtavo_postgresql.so", []),
+                           (self.tavo, ["Fortify Source functions", "Position Independent Executable"])):
+            report = subprocess.run(["hardening-check", path], text=True, stdout=subprocess.PIPE).stdout
+            for property_name in ("Stack protected", "Read-only relocations", "Immediate binding", *also):
+                self.assertIn(f" {property_name}: yes", report, path)
+            # hardening-check asks for a mark that Debian's own start-up files lack.
+            if platform.machine() == "x86_64":
+                self.assertIn("endbr64", run("objdump", "-d", path), path)
+
+    def test_interface_only_grows(self):
+        """abidiff with packaging/tavo.abi. UPDATE_ABI=1 writes that file anew, once a release has added functions."""
+        kept = ROOT / "packaging/tavo.abi"
+        names = ROOT.joinpath("packaging/exports.txt").read_text().split("# version TAVO_1:")[1].split("# version")[0]
+        sources = [*ROOT.glob("core/*.cpp"), ROOT / "beat/click_track.cpp"]
+        objects = [self.folder / f"{source.stem}.o" for source in sources]
+        for source, built in zip(sources, objects):
+            run(CXX, "-std=c++17", "-g", "-O2", "-fPIC", "-I.", "-Idesktop/log", "-c", source.relative_to(ROOT), "-o",
+                built, f"-fdebug-prefix-map={ROOT}=.", cwd=ROOT)
+
+        def library(promised):
+            version_script, built = self.folder / "promised.map", self.folder / "promised.so"
+            version_script.write_text("TAVO_1 { global: %s; local: *; };" % "; ".join(promised))
+            run(CXX, "-shared", *objects, f"-Wl,--version-script={version_script}", f"-Wl,-soname,{SONAME}", "-o", built)
+            return built
+
+        def compare(promised):
+            return subprocess.run(["abidiff", "--no-added-syms", "--headers-dir2", "include", "--drop-private-types", kept,
+                                   library(promised)], cwd=ROOT, text=True, stdout=subprocess.PIPE)
+
+        promised = names.split("\n", 1)[1].split()
+        if "UPDATE_ABI" in os.environ:
+            run("abidw", "--exported-interfaces-only", "--no-corpus-path", "--no-comp-dir-path", "--no-show-locs",
+                "--no-elf-needed", "--headers-dir", "include", "--drop-private-types", "--out-file", kept,
+                library(promised), cwd=ROOT)
+        done = compare(promised)
+        self.assertEqual(done.returncode, 0, done.stdout)
+        self.assertIn("1 Removed function", compare([name for name in promised if name != "tavo_has_audio"]).stdout)
 
     def test_nothing_remembers_the_build(self):
         for path in self.prefix.rglob("*"):

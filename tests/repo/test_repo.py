@@ -62,7 +62,7 @@ def flaws_of(library, names):
     """Names that only one of both has, libraries asked for that are not in NEEDED, and thread-local storage,
     whose first use in a loaded library takes memory that may not be there."""
     symbols = run("nm", "-D", "--defined-only", library).splitlines()
-    exported = [line.split()[-1].split("@")[0] for line in symbols]
+    exported = [line.split()[-1].split("@")[0] for line in symbols if line.split()[1] != "A"]  # A: a symbol version
     needed = re.findall(r"\(NEEDED\).*\[(.*)\]", run("readelf", "-d", library))
     foreign = {name for name in needed if not name.startswith(NEEDED)}
     storage = {word for word in run("readelf", "-lW", library).split() if word == "TLS"}
