@@ -4,11 +4,12 @@
     >>> song = tavo.analyze("song.mp3")
     >>> song.highlight_ms, song.tempo_bpm, song.beats[:3]
 
-The work is done by libtavo.so, several songs at once by the command tavo.
+libtavo.so analyses one song at a time in this process; the command tavo analyses several at once.
 """
 
 from ._library import analyze
 from ._many import analyze_many
 from ._result import Mode, Result, TavoError
 
+__version__ = "1.0.0"
 __all__ = ["Mode", "Result", "TavoError", "analyze", "analyze_many"]

@@ -2,7 +2,14 @@
 
 import os
 import sys
+from typing import NoReturn
 
 from ._location import COMMAND
 
-os.execv(COMMAND, ["tavo", *sys.argv[1:]])
+
+def main() -> NoReturn:
+    os.execv(COMMAND, ["tavo", *sys.argv[1:]])
+
+
+if __name__ == "__main__":
+    main()

@@ -6,7 +6,7 @@ import json
 import os
 import subprocess
 import threading
-from typing import Callable, Iterable, Iterator, Optional, Union
+from typing import IO, Any, Callable, Dict, Iterable, Iterator, List, Optional, Union
 from urllib.parse import unquote_to_bytes
 
 import numpy as np
@@ -35,7 +35,8 @@ def analyze_many(
     return _run(names, mode, length, max_beats, jobs or os.cpu_count() or 1, progress)
 
 
-def _run(names, mode, length, max_beats, jobs, progress):
+def _run(names: List[bytes], mode: str, length: int, max_beats: int, jobs: int,
+         progress: Optional[Callable[[int, int], None]]) -> Iterator[Union[Result, TavoError]]:
     words = [COMMAND, "--format", "json", "--quiet", "--mode", mode, "--length", str(length),
              "--max-beats", str(max_beats), "--jobs", str(jobs), "--null", "--files-from", "-"]
     if mode == "beats":
@@ -44,6 +45,7 @@ def _run(names, mode, length, max_beats, jobs, progress):
         words[words.index("--max-beats"):words.index("--jobs")] = []
     command = subprocess.Popen(words, stdin=subprocess.PIPE, stdout=subprocess.PIPE,
                                stderr=subprocess.DEVNULL)
+    assert command.stdin is not None and command.stdout is not None
     feeder = threading.Thread(target=_feed, args=(command.stdin, names), daemon=True)
     feeder.start()
     done = 0
@@ -63,16 +65,16 @@ def _run(names, mode, length, max_beats, jobs, progress):
         raise RuntimeError(f"tavo ended after {done} of {len(names)} songs")
 
 
-def _feed(pipe, names):
+def _feed(pipe: IO[bytes], names: List[bytes]) -> None:
     try:
         with pipe:
             for name in names:
                 pipe.write(name + b"\0")
-    except BrokenPipeError:  # the command ended: _run tells
+    except BrokenPipeError:  # the command has ended, which _run reports
         pass
 
 
-def _parse(song: dict) -> Union[Result, TavoError]:
+def _parse(song: Dict[str, Any]) -> Union[Result, TavoError]:
     path = unquote_to_bytes(song["file_bytes"]) if "file_bytes" in song else song["file"]
     if song["status"] != "ok":
         return TavoError(path, song["error"])
@@ -84,11 +86,3 @@ def _parse(song: dict) -> Union[Result, TavoError]:
         duration_s=song["duration_ms"] / 1000.0,
         sample_rate=song["sample_rate"],
     )
-
-
-def reason(name: bytes, mode: str) -> TavoError:
-    """Why a song could not be analysed, in the command's words."""
-    for end in _run([name], mode, 0, 0, 1, None):
-        if isinstance(end, TavoError):
-            return end
-    return TavoError(name, "The song could not be analysed.")

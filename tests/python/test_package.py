@@ -8,15 +8,27 @@ import subprocess
 import sys
 import tempfile
 import unittest
+import wave
 from concurrent.futures import ThreadPoolExecutor
 
 CMAKE, BUILD, SONGS = os.environ["CMAKE"], os.environ["BUILD"], pathlib.Path(os.environ["SONGS"])
-EXAMPLE = pathlib.Path(__file__).parents[2] / "examples" / "beats_against_reference.py"
+ROOT = pathlib.Path(__file__).parents[2]
+EXAMPLE = ROOT / "examples" / "beats_against_reference.py"
+JAMS = {  # as its documentation describes a file, an annotation and an observation
+    "required": ["annotations", "file_metadata", "sandbox"],
+    "properties": {
+        "file_metadata": {"required": ["duration", "jams_version"]},
+        "annotations": {"items": {
+            "required": ["annotation_metadata", "data", "namespace"],
+            "properties": {"data": {"type": "array", "items": {
+                "required": ["time", "duration", "value", "confidence"],
+                "properties": dict.fromkeys(("time", "duration"), {"type": "number", "minimum": 0})}}}}}}}
 
 prefix = tempfile.TemporaryDirectory()
 subprocess.run([CMAKE, "--install", BUILD, "--prefix", prefix.name], check=True, stdout=subprocess.DEVNULL)
 packages = f"{prefix.name}/lib/python3/dist-packages"
 sys.path.insert(0, packages)
+import jsonschema  # noqa: E402
 import numpy as np  # noqa: E402
 import tavo  # noqa: E402
 
@@ -54,7 +66,7 @@ class Package(unittest.TestCase):
 
     def test_arguments_reach_the_library(self):
         (told,) = by_command("--length", "10", "--max-beats", "3", songs[0])
-        result = tavo.analyze(pathlib.Path(songs[0]), "both", 10, 3)
+        result = tavo.analyze(pathlib.Path(songs[0]), mode="both", length=10, max_beats=3)
         self.same(result, told)
         self.assertNotEqual(len(result.beats), len(tavo.analyze(songs[0]).beats))
         self.same(next(tavo.analyze_many([songs[0]], "both", 10, 3)), told)
@@ -62,12 +74,49 @@ class Package(unittest.TestCase):
             with self.assertRaises(ValueError):
                 tavo.analyze(songs[0], **wrong)
 
-    def test_failures_are_told_in_the_commands_words(self):
+    def test_failures_have_a_reason(self):
         pathlib.Path("notes.txt").write_text("no music here, but more than a few bytes of it\n")
-        for path in ("notes.txt", "missing.wav"):
-            with self.subTest(path=path), self.assertRaises(tavo.TavoError) as caught:
-                tavo.analyze(pathlib.Path(path))
-            self.assertEqual((str(caught.exception), caught.exception.path), (by_command(path)[0]["error"], path))
+        stereo = np.zeros((44100, 2))
+        for song, rate, reason in (("notes.txt", None, "The format is unknown or not supported."),
+                                   ("missing.wav", None, "The file cannot be opened or has no audio stream."),
+                                   (stereo, 44100, "The audio lasts 1 s or less."),
+                                   (np.zeros(44100), 4000, "The sample rate is below 8000 Hz."),
+                                   (np.zeros(88200), 44100, "No beats were found")):
+            with self.subTest(reason=reason), self.assertRaises(tavo.TavoError) as caught:
+                tavo.analyze(song, rate)
+            self.assertIn(reason, str(caught.exception))
+            self.assertEqual(caught.exception.path, song if rate is None else "")
+        for samples in (np.zeros((2, 2, 2)), np.zeros(0), np.zeros(9, np.int32), np.array([np.nan])):
+            self.assertRaises(ValueError, tavo.analyze, samples, 44100)
+        self.assertRaises(ValueError, tavo.analyze, stereo)
+
+    def test_samples_give_the_result_of_their_file(self):
+        (song,) = (name for name in songs if name.endswith("song.wav"))
+        with wave.open(song) as file:
+            rate, frames = file.getframerate(), file.readframes(file.getnframes())
+            pcm = np.frombuffer(frames, "<i2").reshape(-1, file.getnchannels())
+        expected = tavo.analyze(song)
+        for samples in (pcm, pcm / 32768.0, np.float32(pcm / 32768.0)):
+            result = tavo.analyze(samples, rate)
+            self.assertEqual((result.path, result.highlight_ms, result.tempo_bpm, result.duration_s, result.sample_rate),
+                             ("", *[*vars(expected).values()][1:2], *[*vars(expected).values()][3:]))
+            np.testing.assert_allclose(result.beats, expected.beats, atol=1e-3)
+        np.testing.assert_array_equal(tavo.analyze(pcm, rate).beats, expected.beats)
+
+    def test_forms_of_a_result(self):
+        result = tavo.analyze(songs[0])
+        self.assertEqual(len({result, tavo.analyze(songs[0]), tavo.analyze(songs[0], mode="beats")}), 2)
+        self.assertEqual(json.loads(json.dumps(result.to_dict())), {**vars(result), "beats": [*result.beats]})
+        np.testing.assert_allclose([float(line) for line in result.to_mirex().splitlines()], result.beats, atol=1e-6)
+        for mode, namespaces in (("highlight", ["tag_open"]), ("beats", ["beat", "tempo"]),
+                                 ("both", ["beat", "tempo", "tag_open"])):
+            jams = json.loads(json.dumps(tavo.analyze(songs[0], mode=mode).to_jams()))
+            jsonschema.validate(jams, JAMS)
+            self.assertEqual([annotation["namespace"] for annotation in jams["annotations"]], namespaces)
+
+    def test_types(self):
+        checked = run(sys.executable, "-m", "mypy", "--strict", "--cache-dir", os.getcwd(), ROOT / "python/tavo")
+        self.assertEqual((checked.returncode, checked.stderr), (0, ""), checked.stdout)
 
     def test_many(self):
         pathlib.Path("broken.wav").write_bytes(b"RIFF" + bytes(100))

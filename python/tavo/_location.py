@@ -1,0 +1,13 @@
+"""Where the library and the command are, relative to this package.
+
+The two constants are those of a wheel, which contains both; cmake --install writes its own.
+"""
+
+import os
+
+_TO_LIBRARY = "lib/libtavo.so.1"
+_TO_COMMAND = "bin/tavo"
+
+_here = os.path.dirname(os.path.abspath(__file__))
+LIBRARY = os.path.normpath(os.path.join(_here, _TO_LIBRARY))
+COMMAND = os.path.normpath(os.path.join(_here, _TO_COMMAND))
