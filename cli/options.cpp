@@ -18,6 +18,7 @@ namespace {
 
 constexpr int32_t kMostJobs = 256;
 constexpr int32_t kMostSeconds = 86'400;  // a day: beyond any song, far below what overflows
+constexpr int32_t kMostMinutes = 1'000'000;
 constexpr int32_t kMostBeats = 1'000'000'000;
 
 constexpr const char *kAbout =
@@ -142,6 +143,10 @@ void declare_analysis(CLI::App &app, options &out, raw_values &raw) {
         ->type_name("SECONDS");
     app.add_option("--max-beats", out.max_beats, "Maximum number of threshold-selected beats")
         ->check(whole(0, kMostBeats, ""))
+        ->type_name("N");
+    app.add_option("--max-minutes", out.max_minutes,
+                   "Refuse audio that lasts longer; 600 by default")
+        ->check(whole(1, kMostMinutes, ""))
         ->type_name("N");
     app.add_option("-j,--jobs", out.jobs,
                    "Files analysed at once, each in a process of its own; 1 by default")

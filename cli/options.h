@@ -25,9 +25,10 @@ enum class result_format {
 };
 
 struct options {
-    int32_t mode = 0;       // TAVO_MODE_*
-    int32_t length_s = 0;   // 0 for none
-    int32_t max_beats = 0;  // 0 for no limit
+    int32_t mode = 0;           // TAVO_MODE_*
+    int32_t length_s = 0;       // 0 for none
+    int32_t max_beats = 0;      // 0 for no limit
+    int32_t max_minutes = 600;  // longer audio is refused
     result_format format = result_format::text;
     std::string click;       // where the click track goes, empty for none
     std::string plot;        // where the picture goes, empty for none

@@ -6,6 +6,7 @@ _arguments -s -S \
   '(-m --mode)'{-m+,--mode=}'[what to find]:mode:(highlight beats both)' \
   '(-l --length)'{-l+,--length=}'[length of the highlight wanted]:seconds:' \
   '--max-beats=[maximum number of threshold-selected beats]:number:' \
+  '--max-minutes=[refuse audio that lasts longer]:number:' \
   '(-j --jobs)'{-j+,--jobs=}'[files analysed at once]:number:' \
   '--timeout=[give up a file whose analysis takes longer]:number:' \
   '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive losslesscut ffmetadata edl fcpxml reaper)' \

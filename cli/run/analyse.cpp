@@ -8,6 +8,7 @@
 #include <cerrno>
 
 #include "cli/input/explain.h"
+#include "cli/input/player_offset.h"
 #include "cli/input/short_path.h"
 #include "cli/write/click.h"
 #include "cli/write/value_text.h"
@@ -70,6 +71,11 @@ void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
 // Runs the job of an instance and releases it.
 void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
     read_stream(ctx, out);
+    if (const failure too_long = check_duration(out.duration_ms, opts.max_minutes)) {
+        out.error = too_long.sentence;
+        tavo_deinit(ctx);
+        return;
+    }
     int done_pipe[2];
     if (pipe(done_pipe) != 0) {
         out.error = system_sentence("The analysis could not be started", errno);
@@ -102,6 +108,7 @@ void analyse_opened(const short_path &opened, const options &opts, int stop_fd, 
         return;
     }
     run_job(ctx, opts, stop_fd, out);
+    out.offset_ms = find_player_offset_ms(opened.path, out.sample_rate, out.channels);
 }
 
 // Of this process, all threads: user and system.

@@ -12,6 +12,10 @@ record failed_record(const std::string &file, int32_t mode, const std::string &e
     return result;
 }
 
+double player_ms(const record &result, double ms) {
+    return std::max(ms - result.offset_ms, 0.0);
+}
+
 double highlight_end_ms(const record &result, int32_t length_s) {
     const double start = result.hl_pos_ms;
     const double end = std::min(start + 1000.0 * length_s, static_cast<double>(result.duration_ms));

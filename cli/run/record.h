@@ -23,6 +23,7 @@ struct record {
     int32_t sample_rate = 0;  // Hz
     int32_t channels = 0;     // of the decoder's output
     int64_t duration_ms = 0;
+    double offset_ms = 0.0;  // that times here are later than in a player, player_offset.h
 
     bool has_highlight = false;
     int32_t hl_pos_ms = 0;
@@ -38,6 +39,9 @@ struct record {
 };
 
 record failed_record(const std::string &file, int32_t mode, const std::string &error);
+
+// A time of the record as players count it; not before the song's start.
+double player_ms(const record &result, double ms);
 
 // Where a highlight of length_s seconds ends: at the end of the song at the latest.
 double highlight_end_ms(const record &result, int32_t length_s);

@@ -30,7 +30,8 @@ std::string spaced(const std::vector<float> &times) {
 }  // namespace
 
 std::string csv_head() {
-    return "file,mode,status,sample_rate,channels,duration_ms,hl_pos_ms,hl_end_ms,hl_refined,bpm,"
+    return "file,mode,status,sample_rate,channels,duration_ms,offset_ms,hl_pos_ms,hl_end_ms,hl_"
+           "refined,bpm,"
            "beat_count,beats_ms,cpu_ms,error\n";
 }
 
@@ -43,6 +44,7 @@ std::string csv_record(const record &result) {
     row += "," + when(result.has_stream, result.sample_rate);
     row += "," + when(result.has_stream, result.channels);
     row += "," + when(result.has_stream, result.duration_ms);
+    row += "," + (result.has_stream ? number_text(static_cast<float>(result.offset_ms)) : "");
     row += "," + when(result.has_highlight, result.hl_pos_ms);
     row += "," + when(result.has_highlight && result.length_s > 0,
                       std::llround(highlight_end_ms(result, result.length_s)));

@@ -17,6 +17,7 @@ std::string json_record(const record &result) {
         object["sample_rate"] = result.sample_rate;
         object["channels"] = result.channels;
         object["duration_ms"] = result.duration_ms;
+        object["offset_ms"] = result.offset_ms;
     }
     if (result.has_highlight) {
         object["hl_pos_ms"] = result.hl_pos_ms;
@@ -44,6 +45,7 @@ record record_from_json(const std::string &text) {
     out.sample_rate = object.value("sample_rate", 0);
     out.channels = object.value("channels", 0);
     out.duration_ms = object.value("duration_ms", int64_t{0});
+    out.offset_ms = object.value("offset_ms", 0.0);
     out.has_highlight = object.contains("hl_pos_ms");
     out.hl_pos_ms = object.value("hl_pos_ms", 0);
     out.has_beats = object.contains("bpm");

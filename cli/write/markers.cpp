@@ -56,11 +56,11 @@ double region_end_ms(const record &result) {
 std::vector<mark> marks_of(const record &result) {
     std::vector<mark> marks;
     if (result.has_highlight) {
-        const auto start_ms = static_cast<double>(result.hl_pos_ms);
-        marks.push_back({start_ms, region_end_ms(result), "highlight"});
+        marks.push_back({player_ms(result, result.hl_pos_ms),
+                         player_ms(result, region_end_ms(result)), "highlight"});
     }
     for (size_t i = 0; i < result.beats_ms.size(); ++i) {
-        const auto at = static_cast<double>(result.beats_ms[i]);
+        const double at = player_ms(result, static_cast<double>(result.beats_ms[i]));
         marks.push_back({at, at, "beat " + std::to_string(i + 1)});
     }
     return marks;

@@ -10,8 +10,8 @@
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// The highlight, from its start to its end, or a beat, whose times are equal. Milliseconds from the
-// start of the song.
+// The highlight, from its start to its end, or a beat, whose times are equal. Milliseconds as
+// players count them.
 struct mark {
     double start_ms;
     double end_ms;

@@ -27,13 +27,14 @@ std::vector<chapter> chapters_of(const record &result) {
 }  // namespace
 
 std::string ffmetadata_chapters(const record &result, const options & /*opts*/) {
+    const auto duration_ms = static_cast<double>(result.duration_ms);
     const std::vector<chapter> chapters = chapters_of(result);
     std::string out = ";FFMETADATA1\n";
     for (size_t i = 0; i < chapters.size(); ++i) {
         const long long end_ms =
             i + 1 < chapters.size()
                 ? chapters[i + 1].start_ms
-                : std::max(chapters[i].start_ms, static_cast<long long>(result.duration_ms));
+                : std::max(chapters[i].start_ms, std::llround(player_ms(result, duration_ms)));
         if (end_ms <= chapters[i].start_ms) continue;
         out += "[CHAPTER]\nTIMEBASE=1/1000\nSTART=" + std::to_string(chapters[i].start_ms) +
                "\nEND=" + std::to_string(end_ms) + "\ntitle=" + chapters[i].title + "\n";

@@ -50,8 +50,9 @@ std::string losslesscut_segments(const record &result, const options & /*opts*/)
     for (size_t i = 0; i < marks.size(); ++i) {
         double end_ms = marks[i].end_ms;
         if (end_ms <= marks[i].start_ms) {
-            end_ms = i + 1 < marks.size() ? marks[i + 1].start_ms
-                                          : static_cast<double>(result.duration_ms);
+            end_ms = i + 1 < marks.size()
+                         ? marks[i + 1].start_ms
+                         : player_ms(result, static_cast<double>(result.duration_ms));
         }
         if (end_ms <= marks[i].start_ms) continue;  // two beats at one time
         out +=

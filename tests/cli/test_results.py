@@ -7,7 +7,7 @@ import subprocess
 
 from command_case import AS_ORDINARY_USER, TAVO, Case, standard_song, wav
 
-KEYS = ["file", "mode", "status", "sample_rate", "channels", "duration_ms"]
+KEYS = ["file", "mode", "status", "sample_rate", "channels", "duration_ms", "offset_ms"]
 BEATS = ["bpm", "beat_count", "beats_ms"]
 ASF = bytes.fromhex("3026b2758e66cf11a6d900aa0062ce6c")
 
@@ -62,7 +62,7 @@ class Results(Case):
         for mode, keys in (("highlight", start + ["hl_refined"]), ("beats", BEATS), ("both", start + BEATS)):
             result = self.analyse(f"--mode {mode} --length 12")
             self.assertEqual(list(result), KEYS + keys)
-            self.assertEqual([result[key] for key in KEYS], ["song.wav", mode, "ok", 44100, 2, 60000])
+            self.assertEqual([result[key] for key in KEYS], ["song.wav", mode, "ok", 44100, 2, 60000, 0])
             if mode != "beats":
                 # In mode both a WAV file's highlight moves to a whole second.
                 self.assertAlmostEqual(result["hl_pos_ms"], 20000, delta=1000)
@@ -81,7 +81,7 @@ class Results(Case):
         done = self.run_tavo("--format", "csv", "song.wav", "missing, really.wav", status=1)
         rows = list(csv.DictReader(io.StringIO(done.stdout.decode(), newline=""), strict=True))
         self.assertEqual(list(rows[0]), KEYS + ["hl_pos_ms", "hl_end_ms", "hl_refined"] + BEATS + ["cpu_ms", "error"])
-        for key in KEYS + ["hl_pos_ms", "bpm", "beat_count"]:
+        for key in KEYS[:-1] + ["hl_pos_ms", "bpm", "beat_count"]:
             self.assertEqual(rows[0][key], str(result[key]))
         single = struct.Struct(f"{result['beat_count']}f")  # the library's own precision
         self.assertEqual(single.pack(*map(float, rows[0]["beats_ms"].split())), single.pack(*result["beats_ms"]))
