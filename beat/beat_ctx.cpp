@@ -9,21 +9,21 @@ pthread_cond_t *feat_cond_mt = nullptr;
 
 namespace {
 
-// Frames of frame_size samples that fit, one per hop; the division truncates toward zero, so that a
-// signal a little shorter than a frame still counts as one. That frame is never read.
+// Number of whole frames, one per hop. The division truncates toward zero, so that a signal a
+// little shorter than a frame counts as one; that frame is never read.
 int64_t count_frames(int64_t samples, int32_t frame_size, int32_t hop_size) {
     if (frame_size < 1 || hop_size < 1) return 0;
     return (samples - frame_size) / hop_size + 1;
 }
 
-float **alloc_rows(int32_t rows, int32_t columns) {
+float **allocate_rows(int32_t rows, int32_t columns) {
     auto **matrix = zeroed_items<float *>(rows);
     if (matrix == nullptr) return nullptr;
     for (int32_t i = 0; i < rows; ++i) matrix[i] = zeroed_items<float>(columns);
     return matrix;
 }
 
-bool all_rows_present(float *const *matrix, int32_t rows) {
+bool has_all_rows(float *const *matrix, int32_t rows) {
     for (int32_t i = 0; i < rows; ++i) {
         if (matrix[i] == nullptr) return false;
     }
@@ -81,7 +81,7 @@ bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat) {
 
     beat->frame_times = zeroed_items<float>(beat->frame_count);
     beat->onset_env = zeroed_items<double>(beat->frame_count);
-    beat->mel_matrix = alloc_rows(beat->half_frame, kMelBands);
+    beat->mel_matrix = allocate_rows(beat->half_frame, kMelBands);
     beat->threshold = zeroed_items<double>(beat->frame_count);
     if (with_signal) {
         beat->signal = zeroed_items<double>(n);
@@ -91,7 +91,7 @@ bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat) {
     const bool ready = feat_mutex_mt != nullptr && feat_cond_mt != nullptr &&
                        beat->frame_times != nullptr && beat->onset_env != nullptr &&
                        beat->threshold != nullptr && beat->mel_matrix != nullptr &&
-                       all_rows_present(beat->mel_matrix, beat->half_frame);
+                       has_all_rows(beat->mel_matrix, beat->half_frame);
     if (!ready) return false;
 
     const auto hop = static_cast<float>(beat->hop_seconds);
@@ -102,11 +102,11 @@ bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat) {
     return true;
 }
 
-void scale_samples(sample_view view, int64_t count, double *to) {
+void scale_samples(sample_view view, int64_t count, double *scaled) {
     const double_pair full_scale = {view.full_scale, view.full_scale};
     int64_t i = 0;
-    for (; i + 1 < count; i += 2) store_pair(to + i, load_pair(view.samples + i) / full_scale);
-    if (i < count) to[i] = view.samples[i] / view.full_scale;
+    for (; i + 1 < count; i += 2) store_pair(scaled + i, load_pair(view.samples + i) / full_scale);
+    if (i < count) scaled[i] = view.samples[i] / view.full_scale;
 }
 
 void __tavo_deinit(TAVO_BEAT_CTX *beat) {

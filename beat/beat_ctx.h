@@ -17,7 +17,7 @@ constexpr int32_t kBeatWorkers = 4;
 
 // F = frame_count, n = samples of the analysis signal, N = frame size.
 struct TAVO_BEAT_CTX {
-    double *onset_env;     // [F] spectral change per frame; the last entry stays 0
+    double *onset_env;     // [F] spectral flux per frame; the last entry stays 0
     float **mel_matrix;    // [N / 2] rows, one per FFT bin, of [36] band weights
     float *frame_times;    // [F] seconds, (k + 1) hops
     double *signal;        // [n] ana / 32767
@@ -34,8 +34,8 @@ struct TAVO_BEAT_CTX {
 static_assert(offsetof(TAVO_BEAT_CTX, rise_flags) == 56 &&
               offsetof(TAVO_BEAT_CTX, band_count) == 88);
 
-// Samples of the analysis signal: divided by full_scale they lie between -1 and 1. An instance's
-// ana counts on the 16-bit scale, TAVO_BEAT_CTX.signal is divided already.
+// Samples of the analysis signal. Divided by full_scale they are between -1 and 1: 32767 for an
+// instance's ana, 1 for TAVO_BEAT_CTX.signal.
 struct sample_view {
     const double *samples;
     double full_scale;
@@ -45,14 +45,14 @@ constexpr double kFullScale = 32767.0;  // of ana
 
 extern "C" {
 
-// Serve both worker groups of this folder, from __beat_init to __tavo_deinit; else null.
+// Used by both worker groups of this folder, from __beat_init to __tavo_deinit; otherwise null.
 extern pthread_mutex_t *feat_mutex_mt;
 extern pthread_cond_t *feat_cond_mt;
 
-// Fills a zeroed context from the instance. When memory runs out it stays partly filled.
+// Fills a zeroed context from the instance. If memory runs out it stays partly filled.
 void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
 
-// Releases what hangs from the context, and the lock and condition; not the record itself.
+// Releases what the context owns, the lock and the condition; not the record itself.
 void __tavo_deinit(TAVO_BEAT_CTX *beat);
 
 // Weights of nbands triangles of unit area, equally spaced on the mel scale from 0 to fmax Hz, for
@@ -60,14 +60,14 @@ void __tavo_deinit(TAVO_BEAT_CTX *beat);
 void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float **matrix);
 }
 
-// to[count] = the view's samples over its full scale.
-void scale_samples(sample_view view, int64_t count, double *to);
+// Divides the samples of view by its full scale: scaled[count].
+void scale_samples(sample_view view, int64_t count, double *scaled);
 
 // The body of __beat_init. A job, which reads ana itself, sets with_signal to false: signal and
 // rise_flags, 12 bytes a sample, then stay null. Returns false if memory ran out for the rest.
 bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat);
 
-// Samples of the analysis signal, 0 when there is none.
+// Length of the analysis signal in samples, 0 if there is none.
 inline int64_t analysis_length(const TAVO_CTX *ctx) {
     return ctx->ana != nullptr && ctx->ana_len > 0 ? ctx->ana_len : 0;
 }

@@ -10,17 +10,17 @@
 
 namespace {
 
-// How one stage ended; anything but going_on ends the analysis.
+// Result of a stage; anything except going_on ends the analysis.
 enum outcome { going_on, stopped, out_of_memory };
 
-outcome stop_asked(const TAVO_CTX *ctx) {
+outcome check_stop(const TAVO_CTX *ctx) {
     return load_flag(&ctx->quit) != 0 ? stopped : going_on;
 }
 
-// The power rises of an instance, looked for beside the onset envelope.
+// The search for power rises, which runs while the onset envelope is computed.
 struct rise_search {
     const TAVO_CTX *ctx;
-    int32_t count;     // -2 out of memory
+    int32_t count;     // or TAVO_ERR_MEMORY
     int64_t *samples;  // [count] owned
 };
 
@@ -34,7 +34,7 @@ void search_rises(void *arg) {
     search->count = find_power_rises(view_of(ctx), analysis_length(ctx), &search->samples);
 }
 
-outcome keep_rises(const rise_search *search, int32_t hop_size, TAVO_BEAT_CTX *beat) {
+outcome store_rises(const rise_search *search, int32_t hop_size, TAVO_BEAT_CTX *beat) {
     if (search->count < 0) return out_of_memory;
     if (search->count == 0 || hop_size < 1) return going_on;
     beat->rise_frames = zeroed_items<int32_t>(search->count);
@@ -46,12 +46,12 @@ outcome keep_rises(const rise_search *search, int32_t hop_size, TAVO_BEAT_CTX *b
     return going_on;
 }
 
-outcome take_onsets_and_rises(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
+outcome find_onsets_and_rises(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     const TAVO_ONSET_CTX *onset = ctx->onset;
     rise_search search = {ctx, 0, nullptr};
     const side_work beside = {search_rises, &search};
     compute_onset_envelope(beat, view_of(ctx), onset->frame_size, onset->hop_size, &beside);
-    const outcome end = keep_rises(&search, onset->hop_size, beat);
+    const outcome end = store_rises(&search, onset->hop_size, beat);
     free(search.samples);
     return end;
 }
@@ -63,37 +63,37 @@ outcome find_tempo(TAVO_ONSET_CTX *onset, const TAVO_BEAT_CTX *beat) {
     return going_on;
 }
 
-// Leaves the beats in an array of their exact number; none at all leave it null.
+// Stores the beats in an array of their exact number; without beats it stays null.
 outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
-    auto *room = zeroed_items<float>(candidate_capacity(beat));
-    if (room == nullptr) return out_of_memory;
-    const int32_t count = getBeatCandi_MT(beat, onset, room);
+    auto *times = zeroed_items<float>(candidate_capacity(beat));
+    if (times == nullptr) return out_of_memory;
+    const int32_t count = getBeatCandi_MT(beat, onset, times);
     outcome end = going_on;
     if (count > 0) {
         onset->beat_times = zeroed_items<float>(count);
         if (onset->beat_times == nullptr) {
             end = out_of_memory;
         } else {
-            memcpy(onset->beat_times, room, static_cast<size_t>(count) * sizeof(float));
+            memcpy(onset->beat_times, times, static_cast<size_t>(count) * sizeof(float));
             onset->beat_count = count;
         }
     }
-    free(room);
+    free(times);
     return end;
 }
 
 outcome analyse(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
-    outcome end = stop_asked(ctx);
-    if (end == going_on) end = take_onsets_and_rises(ctx, beat);  // stage 4
+    outcome end = check_stop(ctx);
+    if (end == going_on) end = find_onsets_and_rises(ctx, beat);  // stage 4
     if (end == going_on) end = find_tempo(ctx->onset, beat);      // stage 5
-    if (end == going_on) end = stop_asked(ctx);
+    if (end == going_on) end = check_stop(ctx);
     if (end == going_on) end = find_beats(ctx->onset, beat);  // stage 6
     if (end == going_on) write_click_track(ctx);
     return end;
 }
 
-// Releases what an earlier analysis of the same instance found.
-void forget_beats(TAVO_ONSET_CTX *onset) {
+// Releases the beats of an earlier analysis of the same instance.
+void release_beats(TAVO_ONSET_CTX *onset) {
     free(onset->beat_times);
     onset->beat_times = nullptr;
     onset->beat_count = 0;
@@ -103,7 +103,7 @@ void forget_beats(TAVO_ONSET_CTX *onset) {
 
 int32_t getBeatPosition(TAVO_CTX *ctx) {
     if (ctx == nullptr || ctx->onset == nullptr) return 0;
-    forget_beats(ctx->onset);
+    release_beats(ctx->onset);
     auto *beat = zeroed_items<TAVO_BEAT_CTX>(1);
     if (beat == nullptr) return 0;
 

@@ -9,8 +9,8 @@
 
 extern "C" {
 
-// Returns the number of beats. Sets state 3 when it ran to its end; a stop request, looked at
-// before the onset envelope and after the tempo, ends it with 0 beats and the state as it was.
+// Returns the number of beats and sets the state to finished. A stop request, checked before the
+// onset envelope and after the tempo, ends it with 0 beats and the state as it was.
 int32_t getBeatPosition(TAVO_CTX *ctx);
 
 // Releases the beats and the record itself; null does nothing.

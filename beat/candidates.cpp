@@ -9,35 +9,35 @@
 namespace {
 
 constexpr double kMinute = 60.0;         // seconds: tempo to period
-constexpr int32_t kSlowBpm = 95;         // up to here beats lie at least kSlowSpan apart
+constexpr int32_t kSlowBpm = 95;         // up to here beats are at least kSlowSpan apart
 constexpr float kSlowSpan = 3.0f;        // seconds
 constexpr float kFastSpan = 1.0f;        // seconds
-constexpr int32_t kBeatPerFrame = 2583;  // BPM; a shorter period has no place in the envelope
+constexpr int32_t kBeatPerFrame = 2583;  // BPM of one beat a frame, the fastest
 constexpr double kWindowBeats = 4.0;     // beat periods in the threshold's window
 constexpr float kMsPerSecond = 1000.0f;
 
-// How beats are placed at one tempo.
-struct placement {
-    float span;        // seconds: a whole number of periods, least distance of two beats
+// Distances of beats at one tempo.
+struct spacing {
+    float span;        // seconds: a whole number of periods, the least distance of two beats
     int32_t distance;  // the same in frames
     int32_t window;    // frames in the threshold's window, even
 };
 
-placement place_for(int32_t bpm, float hop) {
+spacing spacing_at(int32_t bpm, float hop) {
     const double period = kMinute / bpm;
     const float least = bpm <= kSlowBpm ? kSlowSpan : kFastSpan;
-    placement place = {};
+    spacing beats = {};
     // float on purpose: the sum runs in single precision
-    while (place.span < least) place.span += static_cast<float>(period);
-    place.distance = static_cast<int32_t>(place.span / hop);
+    while (beats.span < least) beats.span += static_cast<float>(period);
+    beats.distance = static_cast<int32_t>(beats.span / hop);
 
     const auto seconds = static_cast<float>(static_cast<int32_t>(kWindowBeats * period));
-    place.window = static_cast<int32_t>(seconds / hop);
-    if (place.window % 2 != 0) ++place.window;
-    return place;
+    beats.window = static_cast<int32_t>(seconds / hop);
+    if (beats.window % 2 != 0) ++beats.window;
+    return beats;
 }
 
-// Peaks that a rise asked for come first and need no threshold. Returns how many were accepted.
+// Peaks near a power rise come first and need no threshold. Returns how many were accepted.
 int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const double *thr,
                      int32_t max_beats, float *out) {
     int32_t accepted = 0;
@@ -57,19 +57,19 @@ int32_t place_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *th
     const float hop =
         beat->frame_count > 0 ? beat->frame_times[0] : static_cast<float>(beat->hop_seconds);
     if (!(hop > 0.0f)) return 0;
-    const placement place = place_for(onset->bpm, hop);
-    if (build_threshold(beat, place.window, hop, thr) != 0) return 0;
-    const int32_t found = findPeaksPriority(beat->onset_env, count, place.distance, peaks->frames,
+    const spacing beats = spacing_at(onset->bpm, hop);
+    if (build_threshold(beat, beats.window, hop, thr) != 0) return 0;
+    const int32_t found = findPeaksPriority(beat->onset_env, count, beats.distance, peaks->frames,
                                             beat->rise_frames, beat->rise_count);
     peaks->count = found > 0 ? found : 0;
     std::copy(thr, thr + count, beat->threshold);
 
-    // std::sort asks for no memory, and its order may call two values equal. qsort without memory
-    // turns to a method that runs out of bounds with comparators that never do.
+    // std::sort allocates nothing. qsort out of memory runs out of bounds with a comparator that
+    // never reports equality.
     const int32_t accepted = select_beats(beat, peaks, thr, onset->max_beats, out);
     std::sort(peaks->frames, peaks->frames + peaks->count);
     std::sort(out, out + accepted);
-    const int32_t total = accepted + fill_gaps(beat, peaks, place.span, out, accepted);
+    const int32_t total = accepted + fill_gaps(beat, peaks, beats.span, out, accepted);
     std::sort(out, out + total);
     for (int32_t k = 0; k < total; ++k) out[k] *= kMsPerSecond;
     return total;

@@ -3,6 +3,7 @@
 #include <cmath>
 
 #include "beat/beat_ctx.h"
+#include "dsp/fft.h"
 
 extern "C" {
 const char *fnamedec = "d:\\beattest\\__blips_0.wav";
@@ -11,11 +12,10 @@ const char *fnamedec = "d:\\beattest\\__blips_0.wav";
 namespace {
 
 constexpr size_t kHeaderBytes = 44;
-constexpr uint32_t kFileRate = 11025;  // Hz, whatever the analysis rate
+constexpr uint32_t kFileRate = kAnalysisRate;  // Hz
 constexpr uint32_t kFileSampleBytes = 2;
-constexpr double kTwoPi = 6.283185307179586;
 constexpr double kBlipHz = 4000.0;
-constexpr double kBlipScale = 160.0;  // brings the blip's top to about a quarter
+constexpr double kBlipScale = 160.0;  // scales the blip's peak to about a quarter
 constexpr float kBlipSeconds = 0.1f;
 constexpr double kBlipGain = 2.5;
 constexpr int32_t kChunk = 2048;  // samples written at once
@@ -49,7 +49,7 @@ void make_blip(int32_t sr, int32_t length, float *blip) {
     }
 }
 
-// The sample nearest to a beat, n for one behind the n samples, -1 for one before them.
+// Index of the sample nearest to a beat; n for a beat past the n samples, -1 for one before them.
 int64_t beat_sample(float beat, int32_t sr, int64_t n) {
     const float samples = beat * static_cast<float>(sr) / 1000.0f;
     const double nearest = static_cast<double>(samples) + 0.5;
@@ -57,10 +57,10 @@ int64_t beat_sample(float beat, int32_t sr, int64_t n) {
     return nearest < static_cast<double>(n) ? static_cast<int64_t>(nearest) : n;
 }
 
-// A blip truncated at the end of the track stops one sample early; later blips keep the shortened
-// length.
-void lay_blips(const float *blip, int64_t length, const float *beats, int32_t count, int32_t sr,
-               int64_t n, float *track) {
+// A blip truncated at the end of the track stops one sample early, and later blips keep the
+// shortened length.
+void copy_blips(const float *blip, int64_t length, const float *beats, int32_t count, int32_t sr,
+                int64_t n, float *track) {
     for (int32_t b = 0; b < count; ++b) {
         const int64_t start = beat_sample(beats[b], sr, n);
         if (start < 0) continue;
@@ -113,12 +113,12 @@ void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, flo
     auto *blip = zeroed_items<float>(length);
     if (blip == nullptr) return;
     make_blip(sr, length, blip);
-    lay_blips(blip, length, beats, count, sr, n, track);
+    copy_blips(blip, length, beats, count, sr, n, track);
     free(blip);
 }
 
-// The memory comes before the file, so that a file is never begun that cannot be finished, and the
-// blips after it, so that a host that wants no file does not pay for them.
+// Memory is allocated before the file is created, so that no unfinished file is left, and the blips
+// are made after it, so that a host without a file does not pay for them.
 void write_click_track(const TAVO_CTX *ctx) {
     if (fnamedec == nullptr || fnamedec[0] == '\0') return;
     const int64_t n = analysis_length(ctx);
@@ -129,7 +129,7 @@ void write_click_track(const TAVO_CTX *ctx) {
     FILE *stream = blip != nullptr && track != nullptr ? fopen(fnamedec, "wb") : nullptr;
     if (stream != nullptr) {
         make_blip(sr, length, blip);
-        lay_blips(blip, length, ctx->onset->beat_times, ctx->onset->beat_count, sr, n, track);
+        copy_blips(blip, length, ctx->onset->beat_times, ctx->onset->beat_count, sr, n, track);
         makeWaveHeader(static_cast<uint32_t>(n), stream);
         write_samples(ctx->ana, track, n, stream);
         fclose(stream);

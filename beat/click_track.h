@@ -17,8 +17,7 @@ int32_t makeWaveHeader(uint32_t n, FILE *stream);
 void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, float *track);
 }
 
-// Renders and writes the click track of the instance's analysis signal and beats when fnamedec can
-// be created; does nothing else.
+// Writes the click track of the instance's analysis signal and beats if fnamedec can be created.
 void write_click_track(const TAVO_CTX *ctx);
 
 #endif

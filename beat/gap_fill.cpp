@@ -3,21 +3,21 @@
 namespace {
 
 constexpr int32_t kPerGap = 5;        // beats added to one gap at most
-constexpr int32_t kEnoughAdded = 45;  // no further gap once more were added
+constexpr int32_t kEnoughAdded = 45;  // no further gap is filled once more were added
 constexpr float kLongGap = 6.0f;      // seconds, at any tempo
 constexpr float kSpansInGap = 3.0f;
-constexpr int32_t kTimeLead = 2;  // a beat's time lies two hops after its frame's start
+constexpr int32_t kTimeLead = 2;  // a beat's time is two hops after its frame's start
 
 static_assert(kEnoughAdded + kPerGap == kMaxAddedBeats);
 
-// One value among the candidates: where it first appears, and how often.
+// A value among the candidates.
 struct value_rank {
     double value;
-    int32_t first;  // position, -1 for none
-    int32_t times;
+    int32_t first;  // position of its first appearance, -1 for none
+    int32_t times;  // number of appearances
 };
 
-// The largest value below the bound; any when the bound is null.
+// The largest value below *bound; the largest of all if bound is null.
 value_rank next_largest(const int32_t *candidates, int32_t count, const double *env,
                         const double *bound) {
     value_rank best = {0.0, -1, 0};
@@ -33,9 +33,10 @@ value_rank next_largest(const int32_t *candidates, int32_t count, const double *
     return best;
 }
 
-// The maxn largest, largest first. Of equal ones the first is taken as often as they appear.
-int32_t take_strongest(const int32_t *candidates, int32_t count, int32_t maxn, const double *env,
-                       int32_t *dst) {
+// Writes the maxn largest, largest first; if several are equal, the first of them as often as they
+// appear.
+int32_t write_strongest(const int32_t *candidates, int32_t count, int32_t maxn, const double *env,
+                        int32_t *dst) {
     int32_t written = 0;
     value_rank rank = next_largest(candidates, count, env, nullptr);
     while (rank.first >= 0 && written < maxn) {
@@ -55,13 +56,13 @@ int32_t bringMoreBeat(int32_t a, int32_t b, int32_t *dst, const int32_t *peaks, 
     if (maxn < 1) return 0;
     int32_t begin = 0;
     while (begin < npeaks && peaks[begin] < a) ++begin;
-    ++begin;  // behind the first beat's own peak
+    ++begin;  // after the first beat's own peak
     int32_t end = begin;
     while (end < npeaks && peaks[end] < b) ++end;
     if (begin >= npeaks) return 0;
 
     const int32_t count = end - begin;
-    if (count > maxn) return take_strongest(peaks + begin, count, maxn, env, dst);
+    if (count > maxn) return write_strongest(peaks + begin, count, maxn, env, dst);
     for (int32_t k = 0; k < count; ++k) dst[k] = peaks[begin + k];
     return count;
 }
@@ -74,11 +75,11 @@ int32_t fill_gaps(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, float span,
         const float gap = out[k + 1] - out[k];
         if (!(gap > kSpansInGap * span || gap >= kLongGap)) continue;
 
-        const int32_t from = static_cast<int32_t>(out[k] / hop) - kTimeLead;
-        const int32_t to = static_cast<int32_t>(out[k + 1] / hop) - kTimeLead;
+        const int32_t first = static_cast<int32_t>(out[k] / hop) - kTimeLead;
+        const int32_t last = static_cast<int32_t>(out[k + 1] / hop) - kTimeLead;
         int32_t extra[kPerGap];
-        const int32_t found =
-            bringMoreBeat(from, to, extra, peaks->frames, peaks->count, kPerGap, beat->onset_env);
+        const int32_t found = bringMoreBeat(first, last, extra, peaks->frames, peaks->count,
+                                            kPerGap, beat->onset_env);
         for (int32_t t = 0; t < found; ++t) {
             out[count + added + t] = beat->frame_times[extra[t] + 1];
         }

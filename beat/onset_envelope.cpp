@@ -8,8 +8,6 @@
 
 namespace {
 
-typedef float float_pair __attribute__((vector_size(8)));
-
 constexpr double kPowerFloor = 0.0001;  // -80 dB
 
 // A worker of compute_onset_envelope. A job keeps no scaled copy of the signal: worker.signal is
@@ -178,8 +176,8 @@ bool allocate_group(int64_t frames, int32_t frame_size, onset_group *group) {
            group->spectrum != nullptr;
 }
 
-// One worker's record and its rows. The one frame of a signal that has no second one is nobody's:
-// it may exceed the signal.
+// Fills one worker's record and its rows. If there is only one frame, no worker has it: it may
+// exceed the signal.
 void fill_worker(const TAVO_BEAT_CTX *beat, int32_t id, int32_t frame_size, int32_t hop_size,
                  onset_group *group) {
     const int64_t share = beat->frame_count / kBeatWorkers;

@@ -141,7 +141,7 @@ double mean_ahead(const double *db) {
     return sum * 0.125;
 }
 
-// True when a rise starts in the block at db. Never in an unmeasured one: its 60th percentile would
+// True if a rise starts in the block at db. Never in an unmeasured one: its 60th percentile would
 // have to be kUnmeasured too, and no block is quieter than that.
 bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     const double step = mean - kMeanStep;

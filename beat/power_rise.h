@@ -1,8 +1,7 @@
-// Stage 4, beside the onset envelope: the places where the music becomes loud after at least a
+// Stage 4, parallel to the onset envelope: the points where the music becomes loud after at least a
 // second of relative quiet.
 //
-// In: the analysis signal. Out: the samples where rises start. After: beat/candidates.h, which
-// takes their frames.
+// In: the analysis signal. Out: the samples where rises start. After: beat/candidates.h.
 #ifndef TAVO_BEAT_POWER_RISE_H
 #define TAVO_BEAT_POWER_RISE_H
 
@@ -11,12 +10,12 @@
 extern "C" {
 
 // Sets flags[i] (n of them, zero before) to 1 at each sample where a rise starts. Returns how many;
-// -2 out of memory, no flag set.
+// TAVO_ERR_MEMORY, no flag set.
 int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n);
 }
 
 // The body of detectPowerVariation, for the n samples of a view: *samples lists the rises,
-// ascending; the caller frees it whatever is returned. Returns how many; -2 out of memory.
+// ascending; the caller frees it whatever is returned. Returns how many; TAVO_ERR_MEMORY.
 int32_t find_power_rises(sample_view view, int64_t n, int64_t **samples);
 
 #endif

@@ -11,8 +11,8 @@ constexpr double kMinute = 60.0;                // seconds: the excerpt, and the
 constexpr double kSlowestBpm = 30.0;            // sets the largest lag
 constexpr double kPreferredBpm = 120.0;         // centre of the prior
 constexpr double kOctave = 0.6931471805599453;  // ln 2: the prior is one octave wide
-constexpr double kFasterWins = 0.53;  // share of the shorter period above which it is taken
-constexpr int32_t kFastestBpm = 200;  // an estimate above is not believed
+constexpr double kFasterWins = 0.53;            // share of the shorter period above which it wins
+constexpr int32_t kFastestBpm = 200;            // an estimate above it is discarded
 constexpr int32_t kDefaultBpm = 90;
 
 struct period_candidate {
@@ -40,7 +40,7 @@ period_candidate best_of_three(const double *r, int32_t lags) {
     return best;
 }
 
-// The beat period in frames, 0 when no candidate stands out.
+// The beat period in frames, 0 if no candidate has a score.
 int32_t choose_period(const double *r, int32_t lags) {
     const period_candidate two = lags < 4 ? period_candidate{0.0, 0} : best_of_two(r, lags);
     const period_candidate three = lags < 6 ? period_candidate{0.0, 0} : best_of_three(r, lags);
@@ -62,8 +62,8 @@ void weigh_lags(double *r, int32_t lags, double hop) {
     }
 }
 
-// Circular autocorrelation of the excerpt already in re[nfft]: re[t] for t < lags. Lags from nfft
-// on repeat, as those of a circular correlation do.
+// Replaces the excerpt in re[nfft] by its circular autocorrelation, re[t] for t < lags. Lags from
+// nfft on repeat.
 int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32_t lags) {
     if (tavo_dft(re, im, nfft, count, 1) != 0) return TAVO_ERR_MEMORY;
     for (int64_t k = 0; k < nfft; ++k) re[k] = re[k] * re[k] + im[k] * im[k];
@@ -81,15 +81,15 @@ int64_t transform_size(int64_t count) {
     return size;
 }
 
-// The period as the excerpt x[count] gives it; 0 for none; -2 out of memory.
-// A single NaN (silence gives nothing else) makes every correlation NaN, so skip the transforms.
+// The period of the excerpt x[count]; 0 for none; TAVO_ERR_MEMORY. A single NaN, as in silence,
+// makes every correlation NaN: the transforms are skipped.
 int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, double hop) {
     for (int32_t i = 0; i < count; ++i) {
         if (!std::isfinite(x[i])) return 0;
     }
-    const int64_t room = nfft > lags ? nfft : lags;
-    auto *re = zeroed_items<double>(room);
-    auto *im = zeroed_items<double>(room);
+    const int64_t capacity = nfft > lags ? nfft : lags;
+    auto *re = zeroed_items<double>(capacity);
+    auto *im = zeroed_items<double>(capacity);
     int32_t period = TAVO_ERR_MEMORY;
     if (re != nullptr && im != nullptr) {
         for (int32_t i = 0; i < count; ++i) re[i] = x[i];
@@ -110,7 +110,7 @@ int32_t calc_bpm_acf(const double *x, int64_t nfft, int32_t D, int32_t L, double
     const int32_t count = L < nfft ? L : static_cast<int32_t>(nfft);
     const int32_t period = find_period(x, nfft, D, count, hop);
     if (period < 0) return TAVO_ERR_MEMORY;
-    if (period == 0) return kNoPeriodBpm;  // 60 / 0 has no place in an integer
+    if (period == 0) return kNoPeriodBpm;  // 60 / 0 does not fit an integer
     const double bpm = kMinute / (period * hop);
     return bpm < kNoPeriodBpm ? static_cast<int32_t>(bpm) : kNoPeriodBpm;
 }

@@ -5,18 +5,17 @@
 
 #include "beat/beat_ctx.h"
 
-// What calc_bpm_acf returns when no period stands out: above every tempo.
+// Returned by calc_bpm_acf if there is no dominant period; above every tempo.
 constexpr int32_t kNoPeriodBpm = INT32_MAX;
 
 extern "C" {
 
-// x: [L] the excerpt; nfft: a power of two not below L; D: lags looked at, frames; hop: seconds per
-// frame. Returns beats per minute; kNoPeriodBpm; -2 out of memory.
+// x: [L] the excerpt; nfft: a power of two not below L; D: lags used, frames; hop: seconds per
+// frame. Returns beats per minute; kNoPeriodBpm; TAVO_ERR_MEMORY.
 int32_t calc_bpm_acf(const double *x, int64_t nfft, int32_t D, int32_t L, double hop);
 }
 
-// The tempo of the excerpt that the context's envelope gives: 30 to 200, or 90 when there is none;
-// -2 out of memory.
+// Returns the tempo of the context's envelope, 30 to 200, or 90 if there is none; TAVO_ERR_MEMORY.
 int32_t estimate_tempo(const TAVO_BEAT_CTX *beat);
 
 #endif

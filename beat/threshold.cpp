@@ -11,8 +11,8 @@ int32_t percentile_index(int32_t count, int32_t percentile) {
     return static_cast<int32_t>(int64_t{count} * percentile / 100);
 }
 
-// Moves the value at pos to its place among its otherwise ascending neighbours. Values that compare
-// to nothing, as those of a silent song, stay where they are.
+// Moves the value at pos to its sorted position among otherwise ascending values. NaNs (from silent
+// input) are left in place.
 void move_up(double *sorted, int32_t pos, int32_t count) {
     const double value = sorted[pos];
     for (; pos + 1 < count && sorted[pos + 1] < value; ++pos) sorted[pos] = sorted[pos + 1];
@@ -29,7 +29,7 @@ void sort_ascending(double *values, int32_t count) {
     for (int32_t i = 1; i < count; ++i) move_down(values, i);
 }
 
-// The percentile of env[0 .. count - 1]; scratch has room for count.
+// The percentile of env[0 .. count - 1]. scratch: [count].
 double percentile_of(const double *env, int32_t count, double *scratch) {
     for (int32_t i = 0; i < count; ++i) scratch[i] = env[i];
     sort_ascending(scratch, count);
@@ -37,7 +37,7 @@ double percentile_of(const double *env, int32_t count, double *scratch) {
 }
 
 // Slides the sorted window over the worker's range: at index i it holds the W values from half a
-// window before i on. Each step replaces the value that leaves and moves the new one to its place.
+// window before i on. Each step replaces the value that leaves by the one that enters.
 void slide_window(TAVO_THRES_WORKER *worker, double *win) {
     const int32_t size = worker->window;
     const int32_t half = size / 2;
@@ -62,8 +62,8 @@ void slide_window(TAVO_THRES_WORKER *worker, double *win) {
     }
 }
 
-// The work of one worker. One that gets no memory clears its thr pointer, which its starter looks
-// at after the join.
+// The work of one worker. If memory runs out, clears the record's thr pointer, which run_workers
+// checks.
 void run_thres_worker(void *record) {
     auto *worker = static_cast<TAVO_THRES_WORKER *>(record);
     if (worker->first > worker->last || worker->window < 1) return;
@@ -120,7 +120,7 @@ int32_t run_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr, doub
     return 0;
 }
 
-// From the last full window on, a straight line towards top.
+// After the last full window, a straight line towards top.
 void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
     const int64_t fitting = count - window / 2;
     const int64_t start = fitting > 1 ? fitting : 1;
@@ -130,8 +130,8 @@ void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
     }
 }
 
-// Before the first full window, the percentile of the second around each place; the first half
-// second stays 0. Near the end of a short signal the second is cut to the values that exist.
+// Before the first full window, the percentile of the second around each index; the first half
+// second stays 0. At the end of a short signal the second is cut to the values that exist.
 void fill_head(const TAVO_BEAT_CTX *beat, int32_t window, int32_t second, double *thr,
                double *scratch) {
     const int64_t count = beat->frame_count - 1;
@@ -167,7 +167,7 @@ int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, float hop, do
     double top = 0.0;
     const int32_t code = run_workers(beat, window, thr, &top);
     if (code == 0 && window >= 2) {
-        // One or two values short of a full window, the middle has the percentile of all there are.
+        // One or two values short of a full window, the middle gets the percentile of all values.
         if (frames < window && frames >= window - 2 && half < frames - 1) {
             thr[half] = percentile_of(beat->onset_env, static_cast<int32_t>(frames), scratch);
             if (thr[half] > top) top = thr[half];

@@ -32,7 +32,7 @@ void _thd_thres_cleanup(void *record);
 }
 
 // Fills thr[F - 1] (zero before, at least one entry) for a window of W frames, on four threads.
-// hop: seconds a frame. Returns 0; -2 out of memory.
+// hop: seconds a frame. Returns 0; TAVO_ERR_MEMORY.
 int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, float hop, double *thr);
 
 #endif

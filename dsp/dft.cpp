@@ -32,9 +32,9 @@ bool copy_input(complex_copy *copy, const double *re, const double *im, int64_t 
     return true;
 }
 
-// The fast transform spreads one infinite or NaN value over all outputs, where the sums do not
-// everywhere, and its intermediate values must not overflow: such input goes term by term.
-bool suits_fft(const complex_copy &x, int64_t used, int64_t n) {
+// The fast transform spreads an infinite or NaN value over all outputs, which the sums do not, and
+// its intermediate values must not overflow: such input is summed term by term.
+bool is_fit_for_fft(const complex_copy &x, int64_t used, int64_t n) {
     if (!is_fft_size(n)) return false;
     double l1_norm = 0.0;
     for (int64_t i = 0; i < used; ++i) l1_norm += fabs(x.re[i]) + fabs(x.im[i]);
@@ -51,7 +51,7 @@ bool transform_fast(double *re, double *im, int64_t n) {
     return true;
 }
 
-// Terms beyond used are zero and change no sum.
+// Inputs from used on are zero and left out.
 void forward_sums(double *re, double *im, int64_t n, const complex_copy &x, int64_t used,
                   bool real_input) {
     for (int64_t k = 0; k < n; ++k) {
@@ -109,10 +109,10 @@ int32_t tavo_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_inpu
     if (n <= 0) return 0;
     const bool real = real_input != 0;
     const int64_t used = clamp_count(m, n);
-    const bool small = n <= kMaxFftSize;  // the fast transform works inside the copy
+    const bool small = n <= kMaxFftSize;  // the fast transform runs inside the copy
     complex_copy x;
     if (!copy_input(&x, re, real ? nullptr : im, used, small ? n : used)) return TAVO_ERR_MEMORY;
-    if (suits_fft(x, used, n) && transform_fast(x.re, x.im, n)) {
+    if (is_fit_for_fft(x, used, n) && transform_fast(x.re, x.im, n)) {
         const auto bytes = static_cast<size_t>(n) * sizeof(double);
         memcpy(re, x.re, bytes);
         memcpy(im, x.im, bytes);
@@ -129,8 +129,9 @@ int32_t tavo_inverse_dft(double *re, double *im, int64_t n, int64_t m, int32_t r
     const bool real = real_input != 0;
     complex_copy x;
     if (!copy_input(&x, re, real ? nullptr : im, n, n)) return TAVO_ERR_MEMORY;
-    // Real and imaginary part exchanged, before and after, turn the forward into the inverse.
-    if (suits_fft(x, n, n) && transform_fast(x.im, x.re, n)) {
+    // Exchanging real and imaginary part before and after turns the forward transform into the
+    // inverse.
+    if (is_fit_for_fft(x, n, n) && transform_fast(x.im, x.re, n)) {
         for (int64_t t = 0; t < outputs; ++t) {
             re[t] = x.re[t] / static_cast<double>(n);
             im[t] = x.im[t] / static_cast<double>(n);

@@ -27,8 +27,8 @@ static_assert(offsetof(TAVO_FFT_CTX, stages) == 24);
 
 extern "C" {
 
-// Fills ctx whatever it held before. When memory runs out, or n is no power of two from 2 to 16384,
-// all tables are null and stages is 0.
+// Fills ctx, whatever it held before. If memory runs out, or n is not a power of two from 2 to
+// 16384, all tables are null and stages is 0.
 void tavo_fft_init(int16_t n, TAVO_FFT_CTX *ctx);
 
 // Transforms re[n], im[n] in place; n as given to init. A context without tables changes nothing.

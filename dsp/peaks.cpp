@@ -11,8 +11,8 @@ namespace {
 constexpr uint8_t kSuppressed = 1;
 constexpr uint8_t kPriority = 2;
 
-constexpr int64_t kMaxIndexed = INT32_MAX;  // positions that every index list can name
-constexpr int64_t kFar = INT64_MAX / 2;     // farther than any reach
+constexpr int64_t kMaxIndexed = INT32_MAX;  // positions that fit a 32-bit index
+constexpr int64_t kFar = INT64_MAX / 2;     // more than any radius
 
 template <typename Sample>
 bool is_peak(const Sample *x, int64_t i) {
@@ -26,7 +26,8 @@ int64_t count_peaks(const Sample *x, int64_t len) {
     return count;
 }
 
-// The count peaks of x[len] in ascending order, to be freed; null when memory runs out.
+// Returns the count peaks of x[len] in ascending order, which the caller frees; null if memory runs
+// out.
 template <typename Record, typename Sample>
 Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
     auto *peaks = static_cast<Record *>(calloc(static_cast<size_t>(count), sizeof(Record)));
@@ -41,49 +42,49 @@ Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
     return peaks;
 }
 
-// Suppresses the positions at most reach away from index. Marking a peak that ranks before the one
+// Suppresses the positions at most radius away from index. Marking a peak that ranks before the one
 // at index changes nothing: had it survived, it would have suppressed that one, since the range is
-// symmetric. Survivors lie more than reach apart, so all calls together mark each position at most
+// symmetric. Survivors are more than radius apart, so all calls together mark each position at most
 // three times.
-void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t reach) {
-    if (reach < 0) return;
-    const int64_t begin = index > reach ? index - reach : 0;
-    const int64_t end = len - 1 - index > reach ? index + reach : len - 1;
+void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius) {
+    if (radius < 0) return;
+    const int64_t begin = index > radius ? index - radius : 0;
+    const int64_t end = len - 1 - index > radius ? index + radius : len - 1;
     memset(marks + begin, kSuppressed, static_cast<size_t>(end - begin + 1));
 }
 
-// Walks the peaks, largest first, and writes those that survive, at most limit. Returns how many.
+// Writes the surviving peaks, largest first, at most limit. Returns how many.
 template <typename Record, typename Index>
 int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int64_t len,
-                        int64_t reach, int64_t limit, Index *out) {
+                        int64_t radius, int64_t limit, Index *out) {
     int32_t written = 0;
     for (int64_t k = 0; k < count && written < limit; ++k) {
         const int64_t index = peaks[k].index;
         if ((marks[index] & kSuppressed) != 0) continue;
         out[written++] = peaks[k].index;
-        suppress_around(marks, len, index, reach);
+        suppress_around(marks, len, index, radius);
     }
     return written;
 }
 
-// Suppresses everything at most reach away from a position marked as priority, in two sweeps.
-void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t reach) {
+// Suppresses every position at most radius away from a priority position, in two sweeps.
+void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t radius) {
     int64_t distance = kFar;  // to the last priority position seen
     for (int64_t i = 0; i < len; ++i) {
         distance = (marks[i] & kPriority) != 0 ? 0 : distance + 1;
-        if (distance <= reach) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
+        if (distance <= radius) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
     }
     distance = kFar;
     for (int64_t i = len - 1; i >= 0; --i) {
         distance = (marks[i] & kPriority) != 0 ? 0 : distance + 1;
-        if (distance <= reach) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
+        if (distance <= radius) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
     }
 }
 
-// What findNearestIndex answers for strictly ascending positions and a target from 0 on, by halving
-// instead of its walk: a long song has thousands of targets among hundreds of thousands of peaks.
-int32_t nearest_by_halving(const int32_t *list, int32_t target, int32_t n) {
-    int32_t begin = 0;  // all before it lie below target, none from end on does
+// Returns what findNearestIndex does for strictly ascending positions and a target of at least 0,
+// by binary search: a long song has thousands of targets among hundreds of thousands of peaks.
+int32_t search_nearest(const int32_t *list, int32_t target, int32_t n) {
+    int32_t begin = 0;  // all entries before it are below target, none from end on is
     int32_t end = n;
     while (begin < end) {
         const int32_t middle = begin + (end - begin) / 2;
@@ -98,25 +99,25 @@ int32_t nearest_by_halving(const int32_t *list, int32_t target, int32_t n) {
     return list[begin] - target >= target - list[begin - 1] ? begin - 1 : begin;
 }
 
-// Writes the peaks nearest to the priority positions and marks them. Returns how many; -1 when
-// memory runs out.
-int32_t take_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *priority,
-                        int32_t n_priority, uint8_t *marks, int32_t *out) {
+// Writes the peaks nearest to the priority positions and marks them. Returns how many; -1 if memory
+// runs out.
+int32_t write_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *priority,
+                         int32_t n_priority, uint8_t *marks, int32_t *out) {
     if (count < 2 || n_priority < 1) return 0;
     auto *list = static_cast<int32_t *>(malloc(static_cast<size_t>(count) * sizeof(int32_t)));
     if (list == nullptr) return -1;
     for (int32_t k = 0; k < count; ++k) list[k] = peaks[k].index;
-    int32_t taken = 0;
+    int32_t priorities = 0;
     for (int32_t k = 0; k < n_priority; ++k) {
-        // Below 0 the walk's distances may wrap, which halving does not follow.
+        // Distances to a target below 0 may wrap around, which only the linear walk reproduces.
         const int32_t nearest = priority[k] < 0 ? findNearestIndex(list, priority[k], count)
-                                                : nearest_by_halving(list, priority[k], count);
+                                                : search_nearest(list, priority[k], count);
         if (nearest == count - 1) continue;
         marks[list[nearest]] = kPriority;
-        out[taken++] = list[nearest];
+        out[priorities++] = list[nearest];
     }
     free(list);
-    return taken;
+    return priorities;
 }
 
 int32_t wrapping_distance(int32_t a, int32_t b) {
@@ -158,8 +159,8 @@ int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out)
             qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO), compare_peak);
         }
         // Bounds excluded: a peak min_dist away survives.
-        const auto reach = static_cast<int64_t>(min_dist) - 1;
-        written = write_survivors(peaks, count, marks, len, reach, count, out);
+        const auto radius = static_cast<int64_t>(min_dist) - 1;
+        written = write_survivors(peaks, count, marks, len, radius, count, out);
     }
     free(marks);
     free(peaks);
@@ -174,17 +175,18 @@ int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_
     if (count == 0) return 0;
     auto *peaks = collect_peaks<PEAK_INFO>(x, len, count);
     auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
-    int32_t taken = -1;
+    int32_t priorities = -1;
     if (peaks != nullptr && marks != nullptr) {
-        taken =
-            take_priorities(peaks, static_cast<int32_t>(count), priority, n_priority, marks, out);
+        priorities =
+            write_priorities(peaks, static_cast<int32_t>(count), priority, n_priority, marks, out);
     }
     int32_t written = 0;
-    if (taken >= 0) {
-        const auto reach = static_cast<int64_t>(min_dist) - 1;
-        suppress_around_priorities(marks, len, reach);
+    if (priorities >= 0) {
+        const auto radius = static_cast<int64_t>(min_dist) - 1;
+        suppress_around_priorities(marks, len, radius);
         qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO), compare_peak);
-        written = taken + write_survivors(peaks, count, marks, len, reach, count, out + taken);
+        written =
+            priorities + write_survivors(peaks, count, marks, len, radius, count, out + priorities);
     }
     free(marks);
     free(peaks);

@@ -19,19 +19,19 @@ static_assert(offsetof(PEAK_INFO, index) == 8 && sizeof(PEAK_INFO_F) == 8);
 
 extern "C" {
 
-// Peaks of x[len], largest first, without those within min_dist (bounds included) of a larger one,
-// at most max_count (0: no limit). out: room for min(max_count, len / 2). Returns how many were
+// Finds the peaks of x[len], largest first, without those at most min_dist away from a larger one;
+// at most max_count (0: no limit). out: [min(max_count, len / 2)]. Returns how many were
 // written.
 int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_t max_count,
                          uint32_t *out);
 
-// min_dist 0: all peaks in ascending order. Else largest first, without those closer than min_dist
-// to a larger one. out: room for len / 2. Returns how many were written.
+// Finds all peaks in ascending order if min_dist is 0, else largest first, without those closer
+// than min_dist to a larger one. out: [len / 2]. Returns how many were written.
 int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out);
 
-// The peaks nearest to the priority positions first, never suppressed, then the others, largest
-// first, without those closer than min_dist to an entry before them. out: room for n_priority + len
-// / 2. Returns how many were written; -1 when min_dist is 0.
+// Finds the peaks nearest to the priority positions first, never suppressed, then the others,
+// largest first, without those closer than min_dist to an entry before them. out: [n_priority + len
+// / 2]. Returns how many were written; -1 if min_dist is 0.
 int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_t *out,
                           const int32_t *priority, int32_t n_priority);
 

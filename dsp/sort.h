@@ -16,7 +16,7 @@ int compare_ivalue(const void *a, const void *b);  // int32_t, ascending
 // Sorts a[lo .. hi], both included, ascending.
 void quickSort(int32_t lo, int32_t hi, double *a);
 
-// Puts a[lo] at its sorted place among a[lo .. hi] and returns that place.
+// Moves a[lo] to its sorted position among a[lo .. hi] and returns that position.
 int32_t partition(int32_t lo, int32_t hi, double *a);
 
 // Exchanges two 8-byte values.

@@ -28,7 +28,7 @@ uint32_t getHLPosition(TAVO_CTX *ctx) {
     if (_calc_power_level(ctx->pcm, samples, rate, hl) > 0) {
         start = _get_HL_simple(hl, duration_s);
     }
-    // A stream may hold less audio than its duration promises.
+    // The decoded audio may be shorter than the stated duration.
     if (tune_end(rate, start) <= samples) {
         start = _tune_HL_simple(ctx->pcm, rate, start, static_cast<uint32_t>(duration_s));
     }

@@ -9,7 +9,8 @@
 
 extern "C" {
 
-// Returns the start in milliseconds and stores it in hl.hl_pos; 0 below 6 s of PCM.
+// Returns the start in milliseconds and stores it in hl.hl_pos; 0 if there are less than 6 s of
+// PCM.
 uint32_t getHLPosition(TAVO_CTX *ctx);
 
 // Releases the envelope and the context itself; null does nothing.

@@ -7,16 +7,16 @@
 
 namespace {
 
-constexpr int kSections = 2;  // parts of the song summed side by side
-constexpr int kOverlap = 3;   // windows that hold each sample
+constexpr int32_t kSections = 2;  // parts of the song summed side by side
+constexpr int32_t kOverlap = kPowerWindowSeconds / kPowerHopSeconds;  // windows over each sample
 
 float power_of_sum(double sum, int64_t window) {
     const auto mean = static_cast<float>(sum / static_cast<double>(window));
     return 10.0f * log10f(mean + 1.0f);
 }
 
-// Adds hop samples of both sections to the three sums that run over them. Every sum takes its
-// samples in their own order, so it has the bits of a window summed alone.
+// Adds hop samples of both sections to the three windows that overlap there. Each window's samples
+// are added in their order: bit-identical to window_power.
 void add_hop(double_pair sums[kOverlap], const int16_t *first, const int16_t *second, int64_t hop) {
     double_pair oldest = sums[0];
     double_pair middle = sums[1];
@@ -48,14 +48,14 @@ float window_power(const int16_t *pcm, int64_t window) {
 
 void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *out) {
     if (count < 1) return;
-    // With an odd count the sections share a window, which both give the same value.
+    // With an odd count the sections share one window and compute the same value for it.
     const int64_t length = (count + kSections - 1) / kSections;
     const int64_t second = count - length;
     double_pair sums[kOverlap] = {};
     for (int64_t k = 0; k < length + kOverlap - 1; ++k) {
         const int16_t *samples = pcm + k * hop;
         add_hop(sums, samples, samples + second * hop, hop);
-        const int64_t done = k - (kOverlap - 1);  // the window that ends with this hop
+        const int64_t done = k - (kOverlap - 1);  // index of the window that ends with this hop
         if (done >= 0) {
             out[done] = power_of_sum(sums[0][0], kOverlap * hop);
             out[second + done] = power_of_sum(sums[0][1], kOverlap * hop);
@@ -69,15 +69,14 @@ void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *o
 int32_t _calc_power_level(const int16_t *pcm, int64_t sample_count, int32_t rate, TAVO_HL_CTX *hl) {
     hl->power_count = 0;
     if (rate <= 0) return 0;
-    const int64_t last =
-        sample_count - kPowerWindowSeconds * rate;  // the last possible window start
+    // start of the last window
+    const int64_t last = sample_count - int64_t{kPowerWindowSeconds} * rate;
     if (last < 0) return 0;
-    const int64_t hop = kPowerHopSeconds * rate;
+    const int64_t hop = int64_t{kPowerHopSeconds} * rate;
     const int64_t count = last / hop + 1;
     if (count > INT32_MAX) return 0;
     auto *power = static_cast<float *>(malloc(static_cast<size_t>(count) * sizeof(float)));
     if (power == nullptr) return 0;
-    static_assert(kPowerWindowSeconds == kOverlap * kPowerHopSeconds);
     overlapping_powers(pcm, hop, count, power);
     hl->power = power;
     hl->power_count = static_cast<int32_t>(count);

@@ -2,11 +2,11 @@
 
 namespace {
 
-constexpr int32_t kMaxToValley = 25;  // points, 50 s: a valley farther off is not the region's end
+constexpr int32_t kMaxToValley = 25;  // points, 50 s: a valley further away does not end the region
 constexpr int32_t kScanBegin = 7;     // points after chosen, 14 s
 constexpr int32_t kScanEnd = 24;      // 48 s, included
-constexpr int64_t kMinReach = 3;      // points before chosen worth moving the start for
-constexpr int64_t kNearIdeal = 2;     // a valley this close to the ideal start is taken at once
+constexpr int64_t kMinLead = 3;       // points: a shorter lead does not move the start
+constexpr int64_t kNearIdeal = 2;     // a valley this close to the ideal start wins
 
 struct song_curve {
     const float *norm;
@@ -19,10 +19,10 @@ struct song_curve {
     float std;
 };
 
-// A list entry near the ideal start.
+// The list entry nearest to the ideal start.
 struct candidate {
     bool present;
-    bool ran_out;  // the distance still fell at the list's last entry
+    bool at_end;  // the distance was still falling at the last entry of the list
     int32_t pos;
     int64_t distance;  // from the ideal start
 };
@@ -31,8 +31,8 @@ int64_t distance(int64_t a, int64_t b) {
     return a < b ? b - a : a - b;
 }
 
-// Walks list from index first in steps of step, up to and with index last, while the entries come
-// strictly nearer to ideal.
+// Walks list from index first to index last, in steps of step, as long as each entry is strictly
+// nearer to ideal than the one before.
 candidate walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_t last,
                        int32_t step) {
     int32_t k = first;
@@ -44,30 +44,31 @@ candidate walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_
     return {true, k == last, list[k], nearest};
 }
 
-// Index of the last valley not after chosen; -1 when there is none.
+// Index of the last valley at or before chosen; -1 if there is none.
 int32_t valley_before(const song_curve *song, int32_t chosen) {
     int32_t k = 0;
     while (k < song->nv && song->valleys[k] <= chosen) ++k;
     return k - 1;
 }
 
-// The loudness has fallen below last and stays below the mean. Beyond the song's end nothing is
-// known to be below it.
+// True if the loudness falls below last at idx and then stays below the mean. Points past the end
+// of the song count as not below it.
 bool is_drop(const song_curve *song, int32_t idx, float last) {
     if (!(song->norm[idx] < last) || idx + 3 >= song->n) return false;
     return (song->norm[idx + 2] + song->norm[idx + 3]) * 0.5f < song->mean;
 }
 
-int32_t segment_end(const song_curve *song, int32_t chosen, int32_t otherwise) {
+// End of the loud segment that contains chosen; fallback if there is none.
+int32_t segment_end(const song_curve *song, int32_t chosen, int32_t fallback) {
     for (int32_t k = 0; k < song->nseg; ++k) {
         if (song->pairs[2 * k] <= chosen && chosen < song->pairs[2 * k + 1]) {
             return song->pairs[2 * k + 1];
         }
     }
-    return otherwise;
+    return fallback;
 }
 
-// Where a region that begins at chosen ends when no valley tells.
+// End of the region starting at chosen, used if no valley bounds it.
 int32_t scan_for_end(const song_curve *song, int32_t chosen) {
     const float reference = song->norm[chosen];
     float last = reference;
@@ -96,8 +97,10 @@ int32_t scan_for_end(const song_curve *song, int32_t chosen) {
     return found ? drop_pos : segment_end(song, chosen, lowest_pos);
 }
 
-int64_t place_start(const song_curve *song, int32_t chosen, int32_t before, int64_t reach) {
-    const int64_t ideal = chosen - reach;
+// Start of a region that should begin lead points before chosen. before: the valley at or before
+// chosen, or -1.
+int64_t choose_start(const song_curve *song, int32_t chosen, int32_t before, int64_t lead) {
+    const int64_t ideal = chosen - lead;
     candidate valley = {};
     if (before >= 0 && song->valleys[before] < chosen) {
         valley = walk_towards(ideal, song->valleys, before, 0, -1);
@@ -114,10 +117,11 @@ int64_t place_start(const song_curve *song, int32_t chosen, int32_t before, int6
     if (valley.present && valley.pos >= 1 && segment_usable) {
         return segment.distance < valley.distance ? segment.pos : valley.pos;
     }
-    if (segment_usable && !segment.ran_out) return segment.pos;
+    if (segment_usable && !segment.at_end) return segment.pos;
     return ideal > 0 ? ideal : 0;
 }
 
+// start, or an earlier one if the region would exceed the song.
 int64_t fit_in_song(const song_curve *song, int64_t start, int32_t len_pts) {
     if (start + len_pts <= song->n) return start;
     const int64_t valley = song->nv > 0 ? song->valleys[0] : 0;
@@ -137,7 +141,7 @@ uint32_t tavo_select_highlight_region(const float *norm, int32_t n, int32_t len_
     const bool valley_follows = before + 1 < nv && valleys[before + 1] - chosen <= kMaxToValley;
     const int32_t end = valley_follows ? valleys[before + 1] : scan_for_end(&song, chosen);
     const int32_t length = end > chosen ? end - chosen : 0;
-    const auto reach = static_cast<int64_t>(len_pts) - length;  // points wanted before chosen
-    const int64_t start = reach < kMinReach ? chosen : place_start(&song, chosen, before, reach);
+    const auto lead = static_cast<int64_t>(len_pts) - length;  // points wanted before chosen
+    const int64_t start = lead < kMinLead ? chosen : choose_start(&song, chosen, before, lead);
     return static_cast<uint32_t>(fit_in_song(&song, start, len_pts));
 }

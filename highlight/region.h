@@ -1,4 +1,4 @@
-// Stage 7c: the coarse start moved so that a region of the wanted length ends at a natural
+// Stage 7c: moves the coarse start so that a region of the requested length ends at a natural
 // boundary.
 //
 // In and out: indexes into the loudness curve (2 s each). Called by highlight/search.h.
@@ -9,8 +9,8 @@
 
 extern "C" {
 
-// norm: [n] loudness, 0 to 1; mean, std: its population statistics. len_pts: wanted length, points.
-// chosen: the start found. valleys: [15], nv of them used, ascending, the rest 0.
+// norm: [n] loudness, 0 to 1; mean, std: its population statistics. len_pts: requested length,
+// points. chosen: the coarse start. valleys: [15], the first nv used, ascending, the rest 0.
 // pairs: [2 nseg] start, end of each loud segment, ascending. Returns the start index.
 uint32_t tavo_select_highlight_region(const float *norm, int32_t n, int32_t len_pts, int32_t chosen,
                                       int32_t nv, const int32_t *valleys, const int32_t *pairs,

@@ -7,25 +7,25 @@
 
 #include "dsp/peaks.h"
 #include "dsp/stats.h"
+#include "highlight/power_envelope.h"
 #include "highlight/region.h"
+#include "highlight/valleys.h"
 
 namespace {
 
-constexpr int32_t kMinPoints = 4;     // a song needs more beyond the skip
+constexpr int32_t kMinPoints = 4;     // a song needs more after the skipped ones
 constexpr int32_t kMinSegment = 3;    // points of a loud segment
-constexpr int32_t kMinLoudAfter = 4;  // points that a segment must hold on after an edge
-constexpr int32_t kNearValley = 3;    // an edge this close before a valley leads nowhere
+constexpr int32_t kMinLoudAfter = 4;  // points that a segment lasts after an edge
+constexpr int32_t kNearValley = 3;    // an edge this close before a valley is ignored
 constexpr int32_t kMaxSegments = 30;
 constexpr int32_t kMaxEdges = 10;
-constexpr int32_t kMaxValleys = 15;
 constexpr uint32_t kEdgeDistance = 1;
 constexpr int32_t kPercentile = 60;
-constexpr float kHopSeconds = 2.0f;
 constexpr double kMinSecondScore = 0.1;
 
-// The song as the search sees it. Entries of the lists beyond their counts are 0.
+// The song's loudness curve and what the search finds on it. Unused entries of the lists are 0.
 struct search_state {
-    const float *norm;  // [n] envelope over its largest value
+    const float *norm;  // [n] loudness over its largest value
     const float *diff;  // [n - 1] steps of norm
     int32_t n;
     int32_t skip;
@@ -46,20 +46,20 @@ uint32_t point_ms(int64_t k) {
     return static_cast<uint32_t>(static_cast<int64_t>(static_cast<float>(k + k) * 1000.0f));
 }
 
-// Ascending, values that are no numbers last: an order that holds for any content.
-bool power_before(float a, float b) {
+// Ascending, NaNs last: a strict order for any content.
+bool is_less(float a, float b) {
     if (std::isnan(a) || std::isnan(b)) return !std::isnan(a);
     return a < b;
 }
 
-// The largest value, and the 60th percentile in *percentile. False when memory runs out.
-// std::sort asks for no memory; qsort without memory relies on a comparator that can say "equal".
-bool rank_envelope(const float *power, int32_t n, float *largest, float *percentile) {
+// Stores the largest value and the 60th percentile. Returns false if memory runs out. std::sort
+// allocates nothing; qsort out of memory needs a comparator that can report equality.
+bool rank_curve(const float *power, int32_t n, float *largest, float *percentile) {
     const auto count = static_cast<size_t>(n);
     auto *sorted = static_cast<float *>(malloc(count * sizeof(float)));
     if (sorted == nullptr) return false;
     memcpy(sorted, power, count * sizeof(float));
-    std::sort(sorted, sorted + count, power_before);
+    std::sort(sorted, sorted + count, is_less);
     *largest = sorted[n - 1];
     *percentile = sorted[static_cast<int64_t>(n) * kPercentile / 100];
     free(sorted);
@@ -67,7 +67,7 @@ bool rank_envelope(const float *power, int32_t n, float *largest, float *percent
 }
 
 void find_segments(search_state *s) {
-    bool above = false;  // whatever point 0 is: a song loud from there opens its segment at 0
+    bool above = false;  // even if point 0 is: a song loud from the start opens a segment at 0
     for (int32_t k = 0; k < s->n - 1 && s->nseg < kMaxSegments; ++k) {
         const bool next_above = s->norm[k + 1] > s->mean;
         if (!above && next_above) s->start[s->nseg] = k;
@@ -83,7 +83,7 @@ void find_segments(search_state *s) {
     }
 }
 
-// Points from pos to the first valley after it; 0 when there is none.
+// Points from pos to the first valley after it; 0 if there is none.
 int32_t valley_distance(const search_state *s, int32_t pos) {
     for (int32_t k = 0; k < s->nv; ++k) {
         if (s->valley[k] > pos) return s->valley[k] - pos;
@@ -91,7 +91,8 @@ int32_t valley_distance(const search_state *s, int32_t pos) {
     return 0;
 }
 
-bool in_segment(const search_state *s, int32_t pos) {
+// True if pos is in a loud segment that lasts long enough after it.
+bool is_in_segment(const search_state *s, int32_t pos) {
     if (pos > s->n - s->tail) return false;
     for (int32_t k = 0; k < s->nseg; ++k) {
         if (s->start[k] <= pos && pos + kMinLoudAfter <= s->end[k]) return true;
@@ -99,7 +100,7 @@ bool in_segment(const search_state *s, int32_t pos) {
     return false;
 }
 
-// The best scored edge, or the second best when none is; 0 when no edge has a score.
+// The edge with the best score; 0 if no edge has one.
 int32_t score_edges(const search_state *s) {
     float best = 0.0f;
     float second = 0.0f;
@@ -107,7 +108,7 @@ int32_t score_edges(const search_state *s) {
     int32_t second_pos = 0;
     for (int32_t k = 0; k < s->edges; ++k) {
         const auto pos = static_cast<int32_t>(s->edge[k]) + s->skip;
-        if (!in_segment(s, pos)) continue;
+        if (!is_in_segment(s, pos)) continue;
         const int32_t distance = valley_distance(s, pos);
         if (distance >= 1 && distance <= kNearValley) continue;
         const float *norm = s->norm + pos;
@@ -126,7 +127,7 @@ int32_t score_edges(const search_state *s) {
     return best_pos != 0 ? best_pos : second_pos;
 }
 
-// The first edge that leads to a loud point; the last edge when none does.
+// The first edge that leads to a loud point; the last edge if none does.
 int32_t first_loud_edge(const search_state *s) {
     int32_t pos = 0;
     for (int32_t k = 0; k < s->edges; ++k) {
@@ -143,7 +144,7 @@ int32_t choose_edge(const search_state *s) {
     return scored != 0 ? scored : first_loud_edge(s);
 }
 
-// Where the region may begin when it would run past the song's end.
+// Start of the region if one of the requested length would exceed the song.
 int32_t fallback_point(const search_state *s) {
     const int32_t start = s->nseg > 0 ? s->start[0] : 0;
     const int32_t valley = s->nv > 0 ? s->valley[0] : 0;
@@ -151,7 +152,7 @@ int32_t fallback_point(const search_state *s) {
     return start > valley ? start : valley;
 }
 
-int64_t place_region(const search_state *s, int32_t chosen, int32_t hl_param) {
+int64_t select_start(const search_state *s, int32_t chosen, int32_t hl_param) {
     const auto len_pts = static_cast<int32_t>(0.5f * static_cast<float>(hl_param));
     const int32_t fallback = fallback_point(s);
     if (static_cast<int64_t>(fallback) + len_pts >= s->n) return fallback;
@@ -164,8 +165,8 @@ int64_t place_region(const search_state *s, int32_t chosen, int32_t hl_param) {
                                         s->nseg, s->mean, s->std);
 }
 
-// norm: [n] and diff: [n - 1], room to work in. Returns milliseconds.
-uint32_t search_envelope(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm, float *diff) {
+// norm, diff: [n] scratch. Returns milliseconds.
+uint32_t search_curve(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm, float *diff) {
     search_state s = {};
     s.norm = norm;
     s.diff = diff;
@@ -175,7 +176,7 @@ uint32_t search_envelope(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm,
     if (s.n - s.skip <= kMinPoints) return 0;
 
     float largest = 0.0f;
-    if (!rank_envelope(hl->power, s.n, &largest, &s.percentile)) return 0;
+    if (!rank_curve(hl->power, s.n, &largest, &s.percentile)) return 0;
     if (largest == 0.0f) return 0;
     s.percentile /= largest;
     for (int32_t k = 0; k < s.n; ++k) norm[k] = hl->power[k] / largest;
@@ -184,10 +185,10 @@ uint32_t search_envelope(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm,
 
     find_segments(&s);
     s.edges = findsortedNPeaks(diff + s.skip, s.n - s.skip - 1, kEdgeDistance, kMaxEdges, s.edge);
-    s.nv = tavo_find_valley(norm, s.n, s.valley, s.mean, s.std, kHopSeconds);
+    s.nv = tavo_find_valley(norm, s.n, s.valley, s.mean, s.std, kPowerHopSeconds);
 
     const int32_t chosen = s.edges > 0 ? choose_edge(&s) : 0;
-    return point_ms(hl->hl_param > 0 ? place_region(&s, chosen, hl->hl_param) : chosen);
+    return point_ms(hl->hl_param > 0 ? select_start(&s, chosen, hl->hl_param) : chosen);
 }
 
 }  // namespace
@@ -197,7 +198,7 @@ uint32_t _get_HL_simple(TAVO_HL_CTX *hl, int32_t duration_s) {
     const auto count = static_cast<size_t>(hl->power_count);
     auto *norm = static_cast<float *>(malloc(2 * count * sizeof(float)));
     if (norm == nullptr) return 0;
-    const uint32_t start = search_envelope(hl, duration_s, norm, norm + count);
+    const uint32_t start = search_curve(hl, duration_s, norm, norm + count);
     free(norm);
     return start;
 }

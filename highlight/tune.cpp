@@ -6,14 +6,15 @@ namespace {
 
 constexpr double kWindowSeconds = 1.2;
 constexpr double kHopSeconds = 0.4;
-constexpr int64_t kSpanSeconds = 12;   // from the first frame's start to the last one's end
+constexpr int64_t kSpanSeconds = 12;   // from the start of the first frame to the end of the last
 constexpr int64_t kBeforeMs = 3000;    // the first frame starts this long before the coarse start
-constexpr int64_t kMinAfterMs = 9000;  // song needed after the coarse start
+constexpr int64_t kMinAfterMs = 9000;  // audio needed after the coarse start
 constexpr int64_t kEarliest = -999;    // ms x Hz: less than one sample before the song's start
 constexpr int64_t kMaxFrames = 64;     // 27 at the usual rates, at most 44 at any
-constexpr int64_t kRiseFrames = 5;     // frames whose mean a rise is measured to
+constexpr int64_t kRiseFrames = 5;     // frames in the mean that a rise is measured to
 constexpr float kMinRise = 0.13f;
 
+// Loudness frames around the coarse start.
 struct frame_plan {
     int64_t first;   // sample where frame 0 starts
     int64_t window;  // samples
@@ -42,7 +43,8 @@ void measure_frames(const int16_t *pcm, const frame_plan *frames, float *power) 
     }
 }
 
-// The frame before the largest rise above the least that counts, the first of equals; -1 for none.
+// Index of the frame before the largest rise, which exceeds kMinRise; the first if several are
+// equal; -1 if there is none.
 int64_t largest_rise(const float *power, int64_t count) {
     int64_t best = -1;
     float best_rise = kMinRise;
@@ -57,7 +59,7 @@ int64_t largest_rise(const float *power, int64_t count) {
     return best;
 }
 
-// The frame before the smallest of the steps after frame, the first of equals.
+// Index of the smallest of the kRiseFrames steps from frame on; the first if several are equal.
 int64_t smallest_step(const float *power, int64_t frame) {
     int64_t best = frame;
     float best_step = power[frame + 1] - power[frame];

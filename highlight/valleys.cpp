@@ -1,11 +1,10 @@
-#include "highlight/search.h"
+#include "highlight/valleys.h"
 
 namespace {
 
-constexpr int32_t kMaxValleys = 15;
-constexpr double kMinGapSeconds = 7.0;  // low points farther apart belong to different stretches
-constexpr float kLoudMean = 0.5f;       // above it a song is loud throughout: only deep dips count
-constexpr double kDeepDip = 1.5;        // standard deviations below the mean
+constexpr double kMinGapSeconds = 7.0;  // low points this far apart are in different stretches
+constexpr float kLoudMean = 0.5f;  // above it the song is loud throughout: only deep dips count
+constexpr double kDeepDip = 1.5;   // standard deviations below the mean
 
 float low_threshold(float mean, float std) {
     if (mean > kLoudMean) {
@@ -14,7 +13,7 @@ float low_threshold(float mean, float std) {
     return mean - std;
 }
 
-// In envelope points, truncated.
+// In curve points, truncated.
 int32_t minimum_gap(float hop_s) {
     const double gap = kMinGapSeconds / static_cast<double>(hop_s);
     if (gap > 0.0 && gap < static_cast<double>(INT32_MAX)) return static_cast<int32_t>(gap);
@@ -32,7 +31,7 @@ int32_t tavo_find_valley(const float *values, int32_t n, int32_t *out, float mea
     int32_t last_low = 0;
     for (int32_t i = 0; i < n; ++i) {
         if (!(values[i] < threshold)) continue;
-        // A stretch that ends at the song's first point is its opening, no valley.
+        // A stretch that ends at the first point is the song's opening, not a valley.
         if (lows > 0 && i - last_low >= gap && last_low != 0) {
             out[written++] = last_low;
             if (written == kMaxValleys) return written;

@@ -15,6 +15,7 @@
 #include "highlight/region.h"
 #include "highlight/search.h"
 #include "highlight/tune.h"
+#include "highlight/valleys.h"
 
 namespace {
 
