@@ -336,6 +336,19 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv * /*env
     fnamedec = "";
 }
 
+JNIEXPORT jboolean JNICALL Java_com_kestu_tavo_Tavo_isComplete(JNIEnv * /*env*/, jobject /*thiz*/) {
+    return tavo_is_complete(load_pointer(&instance)) != 0 ? JNI_TRUE : JNI_FALSE;
+}
+
+JNIEXPORT jstring JNICALL Java_com_kestu_tavo_Tavo_reason(JNIEnv *env, jclass /*host*/,
+                                                          jstring path) {
+    const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
+    if (path != nullptr && chars == nullptr) return nullptr;  // the exception is pending
+    const int32_t code = tavo_probe(chars, nullptr);
+    if (chars != nullptr) env->ReleaseStringUTFChars(path, chars);
+    return code != TAVO_OK ? env->NewStringUTF(tavo_error_text(code)) : nullptr;
+}
+
 void tavocallback(TAVO_INFO *info) {
     JavaVM *vm = load_pointer(&java_vm);
     bool attached_here = false;

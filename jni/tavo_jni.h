@@ -45,6 +45,12 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *env, jobject thiz
 // Static: sets fnamedec (include/tavo.h) to an empty path, so that no click track is written.
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *env, jclass host);
 
+// True if the job of the open instance decoded the file to its end (tavo_is_complete).
+JNIEXPORT jboolean JNICALL Java_com_kestu_tavo_Tavo_isComplete(JNIEnv *env, jobject thiz);
+
+// Static: why a file cannot be analysed, in words (tavo_probe), or null if it can.
+JNIEXPORT jstring JNICALL Java_com_kestu_tavo_Tavo_reason(JNIEnv *env, jclass host, jstring path);
+
 // The callback of the bridge's instances. Posts exactly one event: (object, 1, hl_pos, beat_count,
 // float[beat_count] or null) for a result, (object, 2, hl_pos, 0, null) for a failure. If the
 // virtual machine has no memory for the array, a result becomes a failure. A thread that is not

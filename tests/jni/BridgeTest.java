@@ -20,6 +20,9 @@ public final class BridgeTest {
         Tavo.disableClickTrack();
         check(analyze(song, Tavo.MODE_BOTH, false).beats > 0, true, "beats were found");
         check(new File("d:\\beattest\\__blips_0.wav").exists(), false, "a click track");
+        check(Tavo.reason(song) == null, true, "a song has no reason");
+        check(Tavo.reason("missing"), "the file cannot be opened or has no audio stream", "reason");
+        check(new Tavo(new Recorder()).isComplete(), false, "complete without an analysis");
         oddNamesAndDescriptors(song, Paths.get(arguments[2]));
         lostObject(clip);
         for (int i = 0; i < 1000; ++i) analyze(clip, i % 3, i % 2 != 0);

@@ -111,7 +111,10 @@ public final class Analyze {
 
         @Override
         public void onFailure(Tavo tavo, int highlight) {
-            error = "No beats were found: the file may be silent or too short for a rhythm.";
+            error =
+                    tavo.isComplete()
+                            ? "No beats were found: the file may be silent or too short for a rhythm."
+                            : "The file could not be read to its end.";
             done.countDown();
         }
     }
@@ -121,7 +124,10 @@ public final class Analyze {
         Tavo tavo = new Tavo(outcome);
         int code = tavo.init(file, mode);
         if (code != 0) {
-            outcome.error = "The file cannot be analysed (code " + code + ").";
+            String reason = Tavo.reason(file);
+            outcome.error =
+                    "The file cannot be analysed: "
+                            + (reason != null ? reason : "out of memory (code " + code + ")") + ".";
             return outcome;
         }
         if (tavo.analyze(lengthSeconds, maxBeats, 0) != 0) {

@@ -82,16 +82,33 @@ public final class Tavo implements AutoCloseable {
      */
     public static native void disableClickTrack();
 
+    /**
+     * Says why a file cannot be analysed. Needs no open analysis.
+     *
+     * @param path the file, may be null
+     * @return an English clause without a period, or null if the file can be analysed
+     */
+    public static native String reason(String path);
+
+    /**
+     * Says whether the analysis decoded the file to its end. Valid from the event until
+     * {@link #deinit}. An event without it is a failure.
+     *
+     * @return false also before the event, after a stop, and without {@link #init}
+     */
+    public native boolean isComplete();
+
     /** Registers the first argument of the events: a weak reference to this object. */
     private native void native_setup(Object obj);
 
     /**
      * Opens a file and prepares its analysis.
      *
-     * @param path the file, fewer than 512 bytes in UTF-8
+     * @param path the file, fewer than 512 bytes in UTF-8; null is answered with
+     *     {@link #ERROR_UNUSABLE}
      * @param mode one of the modes above
      * @return 0, {@link #ERROR_BUSY}, {@link #ERROR_MEMORY} or {@link #ERROR_UNUSABLE}; nothing
-     *     changes on an error
+     *     changes on an error, and {@link #reason} has the reason
      */
     public native int init(String path, int mode);
 
@@ -134,7 +151,7 @@ public final class Tavo implements AutoCloseable {
             Object ref, int what, int arg1, int arg2, float[] beats) {
         Tavo tavo = (Tavo) ((WeakReference<?>) ref).get();
         if (tavo == null) return;
-        if (what == EVENT_RESULT) {
+        if (what == EVENT_RESULT && tavo.isComplete()) {
             tavo.listener.onResult(tavo, arg1, beats != null ? beats : new float[0]);
         } else {
             tavo.listener.onFailure(tavo, arg1);

@@ -12,18 +12,19 @@ public interface TavoListener {
     /**
      * The analysis succeeded.
      *
-     * @param tavo the object whose {@code analyze} was called
+     * @param tavo the object whose {@code analyze} was called, not null
      * @param highlightMs start of the highlight, milliseconds from the start of the file; 0 in
      *     {@link Tavo#MODE_BEATS}
-     * @param beatsMs beat times, milliseconds from the start of the file, ascending; empty in
+     * @param beatsMs beat times, milliseconds from the start of the file, ascending; not null, empty in
      *     {@link Tavo#MODE_HIGHLIGHT}. The listener may keep the array.
      */
     void onResult(Tavo tavo, int highlightMs, float[] beatsMs);
 
     /**
-     * The analysis failed: it found no beats, was stopped, or ran out of memory.
+     * The analysis failed: it found no beats, was stopped, ran out of memory, or could not read the
+     * file to its end ({@link Tavo#isComplete} is false then).
      *
-     * @param tavo the object whose {@code analyze} was called
+     * @param tavo the object whose {@code analyze} was called, not null
      * @param highlightMs start of the highlight in milliseconds if {@link Tavo#MODE_BOTH} had found
      *     it before the failure, else 0
      */

@@ -1,0 +1,11 @@
+# Packs what is in FOLDER, except build files, into the jar OUTPUT, with MANIFEST, by the program JAR.
+file(GLOB_RECURSE files RELATIVE ${FOLDER} ${FOLDER}/*)
+list(FILTER files EXCLUDE REGEX "CMakeLists|cmake$|\\.in$")
+set(arguments "")
+foreach(file ${files})
+  string(APPEND arguments "-C \"${FOLDER}\" \"${file}\"\n")
+endforeach()
+file(WRITE ${OUTPUT}.files "${arguments}")
+execute_process(COMMAND ${JAR} --create --date=2026-01-01T00:00:00Z --file ${OUTPUT} --manifest ${MANIFEST}
+  @${OUTPUT}.files COMMAND_ERROR_IS_FATAL ANY)
+file(REMOVE ${OUTPUT}.files)
