@@ -174,18 +174,13 @@ void declare_output(CLI::App &app, options &out, raw_values &raw) {
                    "(drop-frame), 30 (default), 50, 59.94, 59.94df, 60")
         ->check(CLI::IsMember(frame_rate_names()).description(""))
         ->type_name("RATE");
-    app.add_flag("--force", out.force,
-                 "Overwrite marker files, click tracks and pictures that exist");
+    app.add_flag("--force", out.force, "Overwrite marker files, click tracks and pages that exist");
     app.add_flag("--skip-existing", out.skip_existing, "Leave out inputs whose marker file exists");
     app.add_option("--click", out.click,
                    "Write the analysed sound with a click on every beat, a WAV file; from the "
                    "highlight on in "
                    "mode both; one input only")
         ->type_name("WAV");
-    app.add_option("--plot", out.plot,
-                   "Draw the result, an SVG file: waveform, loudness, highlight and beats; one "
-                   "input only")
-        ->type_name("SVG");
     app.add_option("--report", out.report,
                    "Write a page that shows and plays the song, an HTML file; for several inputs "
                    "an index, the pages in a folder beside it")
@@ -240,7 +235,7 @@ void set_values(const raw_values &raw, options &out) {
         if (raw.format == entry.word) out.format = entry.format;
     }
     if (!raw.fps.empty()) out.fps = raw.fps;
-    for (std::string *path : {&out.click, &out.plot, &out.report, &out.store}) {
+    for (std::string *path : {&out.click, &out.report, &out.store}) {
         unshield(*path);
     }
     unshield(out.output_dir);
@@ -295,14 +290,8 @@ std::string contradiction(const options &out, const raw_values &raw) {
         return "--click needs beats: --mode beats or both.";
     }
     if (out.embed && out.report.empty()) return "--embed is about --report.";
-    if (!out.click.empty() && out.click == out.plot) return "--click and --plot name one file.";
-    if (!out.report.empty() && (out.report == out.plot || out.report == out.click)) {
-        return "--report names the file of another option.";
-    }
-    if ((!out.click.empty() || !out.plot.empty()) && !takes_one_file(out)) {
-        return std::string(out.click.empty() ? "--plot" : "--click") +
-               " takes exactly one audio file.";
-    }
+    if (!out.click.empty() && out.click == out.report) return "--click and --report name one file.";
+    if (!out.click.empty() && !takes_one_file(out)) return "--click takes exactly one audio file.";
     return catalogue_contradiction(out);
 }
 

@@ -31,7 +31,6 @@ struct options {
     int32_t max_minutes = 600;  // longer audio is refused
     result_format format = result_format::text;
     std::string click;       // where the click track goes, empty for none
-    std::string plot;        // where the picture goes, empty for none
     std::string report;      // where the page goes, empty for none
     bool embed = false;      // the sound goes into the page
     std::string output_dir;  // of marker files; empty: beside each input

@@ -23,12 +23,12 @@ _tavo() {
         --shard) mapfile -t COMPREPLY < <(compgen -W 'auto' -- "$word") ;;
         -o | --output-dir) mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
         -l | --length | -j | --jobs | --max-beats | --max-minutes | --patience | --timeout) ;; # a number
-        --click | --plot | --report | --files-from | --store) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
+        --click | --report | --files-from | --store) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
         *)
             if [[ $word == -* ]]; then
                 mapfile -t COMPREPLY < <(compgen -W '-h --help --version
                     -m --mode -l --length --max-beats --max-minutes -j --jobs --timeout
-                    -f --format -o --output-dir --fps --force --skip-existing --click --plot --report --embed -q --quiet
+                    -f --format -o --output-dir --fps --force --skip-existing --click --report --embed -q --quiet
                     -r --recursive --files-from -0 --null
                     --store --retry-failed --redo --from-store --failed --patience --shard' -- "$word")
             else

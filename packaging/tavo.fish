@@ -13,7 +13,6 @@ complete -c tavo -l fps -x -a '23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60
 complete -c tavo -l force -d 'Overwrite files that exist'
 complete -c tavo -l skip-existing -d 'Leave out inputs whose marker file exists'
 complete -c tavo -l click -r -d 'Write the sound with a click on every beat'
-complete -c tavo -l plot -r -d 'Draw the result'
 complete -c tavo -s q -l quiet -d 'No progress bar and no notes'
 complete -c tavo -s r -l recursive -d 'Search folders inside folders too'
 complete -c tavo -l files-from -r -d 'Take names from a list'

@@ -15,7 +15,6 @@ _arguments -s -S \
   '--force[overwrite files that exist]' \
   '--skip-existing[leave out inputs whose marker file exists]' \
   '--click=[write the sound with a click on every beat]:WAV file:_files' \
-  '--plot=[draw the result]:SVG file:_files' \
   '(-q --quiet)'{-q,--quiet}'[no progress bar and no notes]' \
   '(-r --recursive)'{-r,--recursive}'[search folders inside folders too]' \
   '*--files-from=[take names from a list]:list:_files' \

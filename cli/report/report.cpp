@@ -79,10 +79,10 @@ std::string base64(const std::string &bytes) {
 }
 
 // Samples on a scale of -127 to 127 of the song's own peak, lowest and highest in turn.
-result_json wave_of(const plot_data &data) {
+result_json wave_of(const song_view &view) {
     result_json out = result_json::array();
-    const double scale = 127.0 / std::max(data.peak, 1);
-    for (const extent &column : data.waveform) {
+    const double scale = 127.0 / std::max(view.peak, 1);
+    for (const extent &column : view.waveform) {
         out.push_back(std::lround(column.low * scale));
         out.push_back(std::lround(column.high * scale));
     }
@@ -103,19 +103,19 @@ std::string number_cell(const std::string &text, double value) {
            text + "</td>\n";
 }
 
-std::string miniature(const plot_data &data) {
-    if (data.loudness.size() < 2) return "";
+std::string miniature(const song_view &view) {
+    if (view.loudness.size() < 2) return "";
     const auto top =
-        static_cast<double>(*std::max_element(data.loudness.begin(), data.loudness.end()));
+        static_cast<double>(*std::max_element(view.loudness.begin(), view.loudness.end()));
     const double scale = top > 0.0 ? (kMiniatureHeight - 2) / top : 0.0;
     const double step =
-        static_cast<double>(kMiniatureWidth) / static_cast<double>(data.loudness.size() - 1);
+        static_cast<double>(kMiniatureWidth) / static_cast<double>(view.loudness.size() - 1);
     std::string path;
     std::array<char, 64> point{};
-    for (size_t k = 0; k < data.loudness.size(); ++k) {
+    for (size_t k = 0; k < view.loudness.size(); ++k) {
         snprintf(point.data(), point.size(), "%c%.1f %.1f", k == 0 ? 'M' : 'L',
                  static_cast<double>(k) * step,
-                 kMiniatureHeight - 1 - static_cast<double>(data.loudness[k]) * scale);
+                 kMiniatureHeight - 1 - static_cast<double>(view.loudness[k]) * scale);
         path += point.data();
     }
     return "<svg viewBox=\"0 0 140 28\" role=\"img\" aria-label=\"Loudness\"><path class=\"loud\" "
@@ -150,20 +150,20 @@ std::string find_sound(const std::string &song_path, const std::string &page_pat
 }
 
 // The whole page, UTF-8.
-std::string report_page(const record &result, const plot_data &data, const report_sound &sound) {
+std::string report_page(const record &result, const song_view &view, const report_sound &sound) {
     result_json song = {{"name", as_utf8(base_name(result.file))},
                         {"mode", mode_word(result.mode)},
                         {"sample_rate", result.sample_rate},
                         {"channels", result.channels},
                         {"duration_ms", result.duration_ms},
-                        {"length_ms", data.length_ms},
-                        {"read_ms", data.read_ms},
-                        {"wave", wave_of(data)},
-                        {"loudness", data.loudness},
-                        {"mean", data.mean}};
+                        {"length_ms", view.length_ms},
+                        {"read_ms", view.read_ms},
+                        {"wave", wave_of(view)},
+                        {"loudness", view.loudness},
+                        {"mean", view.mean}};
     if (result.has_highlight) {
         song["hl_pos_ms"] = result.hl_pos_ms;
-        if (!data.loudness.empty()) song["searched_ms"] = searched_span(result, data);
+        if (!view.loudness.empty()) song["searched_ms"] = searched_span(result, view);
         song["region_end_ms"] = region_end_ms(result);
         if (result.length_s > 0) song["hl_end_ms"] = song["region_end_ms"];
         if (has_refinement(result)) song["hl_refined"] = is_refined(result);
@@ -196,12 +196,12 @@ std::string index_part(bool before) {
 }
 
 std::string make_page(record &result, const options &opts, const std::string &target, int stop_fd,
-                      plot_data &data) {
+                      song_view &view) {
     std::string error;
-    const outcome read = gather_plot(result, kReportColumns, stop_fd, data, error);
+    const outcome read = read_song_view(result, kReportColumns, stop_fd, view, error);
     report_sound sound;
     if (error.empty()) error = find_sound(result.file, target, opts.embed, sound);
-    if (error.empty()) error = write_file(target, report_page(result, data, sound), opts.force);
+    if (error.empty()) error = write_file(target, report_page(result, view, sound), opts.force);
     if (error.empty()) return "";
     result = failed_record(result.file, result.mode, error);
     if (read == outcome::stopped) result.status = outcome::stopped;
@@ -222,14 +222,18 @@ std::string check_report(const std::string &target, bool force) {
     if (recognise(target, kind) == 0 && kind != file_kind::unknown) {
         return "The page " + shown(target) + " would replace a song.";
     }
+    struct stat info {};
+    if (lstat(target.c_str(), &info) == 0 && !S_ISREG(info.st_mode) && !S_ISDIR(info.st_mode)) {
+        return "The page " + shown(target) + " cannot be written: it is not a regular file.";
+    }
     return check_target(target, force);
 }
 
 void write_report_page(record &result, const options &opts, const std::string &target, int stop_fd,
                        std::string &row) {
-    plot_data data;
-    if (!make_page(result, opts, target, stop_fd, data).empty()) return;
-    row = report_index_row(result, data, base_name(pages_folder(opts)) + "/" + base_name(target));
+    song_view view;
+    if (!make_page(result, opts, target, stop_fd, view).empty()) return;
+    row = report_index_row(result, view, base_name(pages_folder(opts)) + "/" + base_name(target));
 }
 
 std::string begin_report_index(report_index &index, const options &opts) {
@@ -263,7 +267,7 @@ std::string finish_report_index(report_index &index, const options &opts) {
     return error;
 }
 
-std::string report_index_row(const record &result, const plot_data &data, const std::string &page) {
+std::string report_index_row(const record &result, const song_view &view, const std::string &page) {
     const std::string name = html_text(base_name(result.file));
     if (page.empty()) {
         return "<tr><td class=\"name\">" + name + "</td><td colspan=\"5\">" +
@@ -279,5 +283,5 @@ std::string report_index_row(const record &result, const plot_data &data, const 
            (result.has_beats ? number_cell(std::to_string(result.beats_ms.size()),
                                            static_cast<double>(result.beats_ms.size()))
                              : "<td></td>\n") +
-           "<td>" + miniature(data) + "</td></tr>\n";
+           "<td>" + miniature(view) + "</td></tr>\n";
 }

@@ -1,6 +1,6 @@
 // The page that shows and plays a song's result, and the index of several songs' pages: --report.
 //
-// In: a record (record.h) and its picture's data (plot.h). Out: HTML files that need no network.
+// In: a record (record.h) and its song_view. Out: HTML files that need no network.
 // Pages are written in the worker, after analyse.h; the index by the command (ordered_output.h).
 #ifndef TAVO_CLI_REPORT_REPORT_H
 #define TAVO_CLI_REPORT_REPORT_H
@@ -9,14 +9,15 @@
 #include <string>
 
 #include "cli/options.h"
-#include "cli/report/plot.h"
+#include "cli/report/song_view.h"
 #include "cli/run/record.h"
 #include "cli/write/output_file.h"
 
 // The file of a song's page: opts.report itself for one file, else a file in a folder beside it.
 std::string report_page_path(const options &opts, uint64_t index, const std::string &song);
 
-// Whether a page could be written: never over a song. Returns an empty string or a sentence.
+// Checks that a page can be written: never over a song or a device. Returns an empty string or a
+// sentence.
 std::string check_report(const std::string &target, bool force);
 
 // Reads the sound of result.file, writes its page and makes its row of the index. A failure or a
@@ -25,7 +26,7 @@ void write_report_page(record &result, const options &opts, const std::string &t
                        std::string &row);
 
 // A row of the index. page: relative to the index; empty for a song that failed.
-std::string report_index_row(const record &result, const plot_data &data, const std::string &page);
+std::string report_index_row(const record &result, const song_view &view, const std::string &page);
 
 // The index under way; nothing is done where opts asks for none. These return an empty string or a
 // sentence. What was added by the time of a stop is kept.

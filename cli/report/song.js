@@ -19,10 +19,10 @@ function clock(ms) {
   return h > 0 ? `${h}:${String(m).padStart(2, "0")}:${s}` : `${m}:${s}`;
 }
 
-function shape(name, attributes) {
+function shape(name, attributes, parent = svg) {
   const made = document.createElementNS("http://www.w3.org/2000/svg", name);
   for (const key in attributes) made.setAttribute(key, attributes[key]);
-  svg.append(made);
+  if (parent !== null) parent.append(made);
   return made;
 }
 
@@ -91,6 +91,52 @@ function drawTicks() {
     ticks.push(label);
   }
   byId("times").replaceChildren(...ticks);
+}
+
+// ---- The picture as a file: what the view shows, in pixels and with its colours as attributes, so
+// that every program draws it alike.
+
+function pictureSvg() {
+  const width = 1200, height = 360, top = 34, bottom = 330;
+  const ink = getComputedStyle(document.body);
+  const x = (ms) => (width * (ms - view.from) / (view.to - view.from)).toFixed(1);
+  const y = (percent) => (top + (bottom - top) * percent / 100).toFixed(1);
+  const span = (from, to, scale) => Math.abs(scale(from) - scale(to)).toFixed(1);
+  const root = shape("svg", { xmlns: svg.namespaceURI, width, height, viewBox: `0 0 ${width} ${height}`,
+    "font-family": "sans-serif", "font-size": 14, fill: ink.color }, null);
+  const text = (words, left, base, anchor) => {
+    shape("text", { x: left, y: base, "text-anchor": anchor }, root).textContent = words;
+  };
+  shape("title", {}, root).textContent = song.name;
+  shape("rect", { width, height, fill: ink.backgroundColor }, root);
+  text(song.name, 8, 22, "start");
+  for (const part of svg.children) {
+    const style = getComputedStyle(part);
+    const look = { class: part.getAttribute("class"), fill: style.fill, stroke: style.stroke, opacity: style.opacity,
+      "stroke-width": parseFloat(style.strokeWidth), "stroke-dasharray": style.strokeDasharray };
+    const at = (name) => Number(part.getAttribute(name));
+    if (part === playhead) continue;
+    if (part.tagName === "path") {
+      look.d = part.getAttribute("d").replace(/(-?[\d.]+) (-?[\d.]+)/g, (_, ms, percent) => `${x(ms)} ${y(percent)}`);
+    } else if (part.tagName === "line") {
+      Object.assign(look, { x1: x(at("x1")), x2: x(at("x2")), y1: y(at("y1")), y2: y(at("y2")) });
+    } else {
+      Object.assign(look, { x: x(at("x")), y: y(at("y")), width: span(at("x") + at("width"), at("x"), x), height: span(100, 0, y) });
+    }
+    shape(part.tagName, look, root);
+  }
+  for (const label of byId("times").children) {
+    text(label.textContent, width * parseFloat(label.style.left) / timeline.clientWidth, 350, "middle");
+  }
+  return new XMLSerializer().serializeToString(root);
+}
+
+function download(name, type, content) {
+  const link = document.createElement("a");
+  link.href = URL.createObjectURL(new Blob([content], { type }));
+  link.download = name;
+  link.click();
+  setTimeout(() => URL.revokeObjectURL(link.href), 1000);
 }
 
 function show(from, to) {
@@ -281,6 +327,7 @@ const actions = {
   whole: () => show(0, song.length_ms),
   tobeat: zoomToBeat,
   follow: () => toggle("follow"),
+  picture: () => download(song.name + ".svg", "image/svg+xml", pictureSvg()),
 };
 const keys = { " ": "play", k: "play", h: "gohl", l: "loop", c: "clicks", ",": "prev", ".": "next", "+": "in", "-": "out", 0: "whole", z: "tobeat", f: "follow" };
 for (const id in actions) byId(id).addEventListener("click", actions[id]);

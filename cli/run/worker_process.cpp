@@ -10,7 +10,6 @@
 #include <iterator>
 #include <nlohmann/json.hpp>
 
-#include "cli/report/plot.h"
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
 #include "cli/write/file_names.h"
@@ -81,12 +80,6 @@ companion markers_of(const request &asked, const options &opts) {
             [=](record &result) { write_markers(result, opts, target); }};
 }
 
-companion picture_of(const request &asked, const options &opts, int stop_fd) {
-    if (opts.plot.empty()) return {};
-    return {true, check_plot(opts.plot, asked.path, opts.force),
-            [=](record &result) { draw_plot(result, opts, stop_fd); }};
-}
-
 companion page_of(const request &asked, const options &opts, int stop_fd, std::string &row) {
     if (opts.report.empty()) return {};
     const std::string target = report_page_path(opts, asked.index, asked.path);
@@ -98,8 +91,7 @@ companion page_of(const request &asked, const options &opts, int stop_fd, std::s
 // does not take that for a song that fails.
 record analyse_and_write(const request &asked, const options &opts, int stop_fd, std::string &row,
                          bool &is_kept) {
-    const companion companions[] = {picture_of(asked, opts, stop_fd),
-                                    page_of(asked, opts, stop_fd, row), markers_of(asked, opts)};
+    const companion companions[] = {page_of(asked, opts, stop_fd, row), markers_of(asked, opts)};
     for (const companion &each : companions) {
         is_kept = each.refusal.empty();
         if (!is_kept) return failed_record(asked.path, opts.mode, each.refusal);

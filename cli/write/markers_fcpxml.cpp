@@ -3,10 +3,10 @@
 #include <cstdlib>
 #include <memory>
 
-#include "cli/report/svg.h"
 #include "cli/write/file_names.h"
 #include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
+#include "cli/write/xml.h"
 
 namespace {
 

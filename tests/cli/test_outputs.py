@@ -1,13 +1,13 @@
-"""Files that the command writes - label tracks, click tracks, pictures, pages: whole or not there."""
+"""Files that the command writes - label tracks, click tracks, pages: whole or not there."""
 import os
 import resource
 
 from command_case import AS_ORDINARY_USER, Case, short_song, wav
 
-LABELS, PICTURE = ["--format", "labels"], ["--plot", "p.svg"]
+LABELS = ["--format", "labels"]
 ALL = (  # what writes which file for song.wav, and what is in it
-    (LABELS, "song.wav.labels.txt", b"highlight"), (PICTURE, "p.svg", b"highlight"),
-    (["--click", "c.wav"], "c.wav", b"RIFF"), (["--report", "page.html"], "page.html", b"song.wav"))
+    (LABELS, "song.wav.labels.txt", b"highlight"), (["--click", "c.wav"], "c.wav", b"RIFF"),
+    (["--report", "page.html"], "page.html", b"song.wav"))
 
 
 class Outputs(Case):
@@ -21,8 +21,9 @@ class Outputs(Case):
         self.assert_only("song.wav")
         mask = os.umask(0o027)
         self.addCleanup(os.umask, mask)
-        self.run_tavo("--plot", "[p,q].svg", "--click", "c.wav", *LABELS, "song.wav", printed=b"song.wav.labels.txt\n")
-        written = ("song.wav.labels.txt", "c.wav", "[p,q].svg")
+        self.run_tavo("--report", "[p,q].html", "--click", "c.wav", *LABELS, "song.wav",
+                      printed=b"song.wav.labels.txt\n")
+        written = ("song.wav.labels.txt", "c.wav", "[p,q].html")
         self.assert_only("song.wav", *written)
         self.assertEqual(self.song.read_bytes(), before)
         self.assertEqual([(self.folder / name).stat().st_mode & 0o777 for name in written], 3 * [0o640])
@@ -40,15 +41,12 @@ class Outputs(Case):
 
     def test_places_that_cannot_be_written(self):
         before = self.song.read_bytes()
-        (self.folder / "link.svg").symlink_to("/dev/null")
-        for option, places in (("--click", "song.wav . nowhere/c.wav"), ("--report", "song.wav . nowhere/page.html"),
-                               ("--plot", "song.wav ./song.wav . nowhere/p.svg link.svg /dev/null")):
+        for option, places in (("--click", "song.wav . nowhere/c.wav"), ("--report", "song.wav ./song.wav . nowhere/page.html")):
             for place in places.split():
                 (result,) = self.run_json("--force", option, place, "song.wav", status=1)
-                self.assertRegex(result["error"], "click|picture|page|cannot be written", (option, place))
+                self.assertRegex(result["error"], "click|page|cannot be written", (option, place))
         self.assertEqual(self.song.read_bytes(), before)
-        self.assertTrue((self.folder / "link.svg").is_symlink())
-        self.assert_only("song.wav", "link.svg")
+        self.assert_only("song.wav")
 
     def test_failures_leave_nothing(self):
         self.put("silent.wav", wav(seconds=3, sample=bytes(32)))

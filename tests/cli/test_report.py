@@ -1,12 +1,16 @@
 """The page that plays, in a real browser: Debian's Chromium without a window."""
+import json
 import os
+import re
+import struct
+import xml.etree.ElementTree as ElementTree
 
 from selenium import webdriver
 from selenium.webdriver.chrome.service import Service
 from selenium.webdriver.common.by import By
 from selenium.webdriver.support.ui import WebDriverWait
 
-from command_case import SONGS, Case, short_song, standard_song
+from command_case import SONGS, Case, short_song, song, standard_song, wav
 
 ARGUMENTS = """--headless=new --no-sandbox --disable-gpu --disable-quic --no-first-run --disable-background-networking
     --disable-component-update --disable-sync --disable-dev-shm-usage --mute-audio"""
@@ -80,6 +84,39 @@ class Report(Case):
         self.wait("Math.abs(player.now() - beats[0]) < 1")
         self.wait("document.getElementById('status').textContent.endsWith('copied.')")
         self.assertEqual(self.browser.get_log("browser"), [])
+
+    def test_the_picture_is_saved_as_seen(self):
+        self.put("song.wav", source=standard_song())
+        (result,) = self.run_json("--length", "12", "--report", "page.html", "song.wav")
+        self.show("page.html")
+        self.click("tobeat", "out", "out", "out")  # 16 s of 60
+        start, end = self.script("return [view.from, view.to]")
+        root = ElementTree.fromstring(self.script("return pictureSvg()"))
+        lines = [e for e in root.iter() if e.get("class") in ("beat", "start")]
+        times = [start + float(e.get("x1")) * (end - start) / 1200 for e in lines]
+        for shown, ms in zip(times, [*result["beats_ms"], result["hl_pos_ms"]], strict=True):
+            self.assertAlmostEqual(shown, ms, delta=2)
+        self.assertEqual({e.get("stroke") for e in lines}, {"rgb(27, 27, 27)", "rgb(194, 78, 0)"})
+        self.assertIn("song.wav", [e.text for e in root])
+
+    def test_waveform_and_loudness(self):
+        def view(name, *arguments):
+            self.run_tavo("--report", "page.html", "--force", *arguments, name)
+            return json.loads(re.search(r'id="data">(.*?)</script>', (self.folder / "page.html").read_text())[1])
+
+        # 10 s: half a full-scale square wave from 4 s on, silence before.
+        rate, level = 8000, 32768 // 2
+        loud = b"".join(struct.pack("<h", level if i // 40 % 2 else -level) for i in range(6 * rate))
+        self.put("steps.wav", wav(seconds=10, rate=rate)[:44] + bytes(2 * 4 * rate) + loud)
+        page = view("steps.wav", "--mode", "highlight")
+        wave = page["wave"]  # 4000 columns of 2.5 ms: the 1600th starts with the sound
+        self.assertEqual((len(wave), {*wave[:3198]}, {*wave[3202:]}), (8000, {0}, {-127, 127}))
+        # 10 log10(1 + part / 4): a third, two thirds and all of the window is loud, mean square 1/4.
+        for value, expected in zip([*page["loudness"], page["mean"]], (0.348, 0.669, 0.969, 0.662), strict=True):
+            self.assertAlmostEqual(value, expected, delta=0.001)
+        for seconds, searched in ((60, [0, 42000]), (100, [18000, 52000])):
+            self.put("song.wav", source=song(seconds=seconds, bpm=120, rate=8000, channels=1))
+            self.assertEqual(view("song.wav", "--mode", "highlight")["searched_ms"], searched)
 
     def test_screens(self):
         self.put("song.wav", source=standard_song())

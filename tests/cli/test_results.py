@@ -20,8 +20,8 @@ USAGE = [
     ("--format labels --output-dir nowhere a.wav", "nowhere"), ("--fps 25 a.wav", "edl and fcpxml"),
     ("--fps 26 -f edl a.wav", "--fps"),
     ("--click c.wav .", "--click takes exactly one"), ("--click c.wav --mode highlight a.wav", "needs beats"),
-    ("--plot p.svg a.wav b.wav", "--plot takes exactly one"), ("--plot p.svg -", "--plot takes exactly one"),
-    ("--plot p --click p a.wav", "name one file"), ("--embed a.wav", "--report"),
+    ("--report p --click p a.wav", "name one file"), ("--click c.wav -", "--click takes exactly one"),
+    ("--embed a.wav", "--report"),
 ]
 REFUSED = {  # content when it is a file of ours, a part of the sentence
     "empty.wav": (b"", "empty"),

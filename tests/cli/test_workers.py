@@ -91,7 +91,7 @@ class Workers(Case):
                 (os.kill, signal.SIGTERM, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
                 (os.killpg, signal.SIGINT, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
                 (os.kill, signal.SIGINT, "-j 2 long.wav a.wav ./a.wav other.wav", "other.wav", ["a.wav", "./a.wav"]),
-                (os.kill, signal.SIGINT, "--plot p.svg long.wav", "long.wav", [])):
+                (os.kill, signal.SIGINT, "--report p.html long.wav", "long.wav", [])):
             with self.subTest(words=words, send=send):
                 process = self.start(*words.split())
                 worker = first = self.worker_with(process, "long.wav")
