@@ -31,8 +31,8 @@ struct TAVO_BEAT_CTX {
     int32_t band_count;   // 36
 };
 
-static_assert(offsetof(TAVO_BEAT_CTX, rise_flags) == 56 &&
-              offsetof(TAVO_BEAT_CTX, band_count) == 88);
+static_assert(sizeof(void *) != 8 || (offsetof(TAVO_BEAT_CTX, rise_flags) == 56 &&
+                                      offsetof(TAVO_BEAT_CTX, band_count) == 88));
 
 // Samples of the analysis signal. Divided by full_scale they are between -1 and 1: 32767 for an
 // instance's ana, 1 for TAVO_BEAT_CTX.signal.

@@ -31,7 +31,8 @@ struct TAVO_ONSET_WORKER {
     double **mel;             // [F] rows of [36] decibels, shared
     const double *window;     // [N] shared, read-only
 };
-static_assert(offsetof(TAVO_ONSET_WORKER, fft) == 64 && offsetof(TAVO_ONSET_WORKER, window) == 128);
+static_assert(sizeof(void *) != 8 || (offsetof(TAVO_ONSET_WORKER, fft) == 64 &&
+                                      offsetof(TAVO_ONSET_WORKER, window) == 128));
 
 extern "C" {
 

@@ -21,8 +21,8 @@ struct TAVO_THRES_WORKER {
     pthread_mutex_t *mutex;   // feat_mutex_mt
     pthread_cond_t *cond;     // feat_cond_mt
 };
-static_assert(offsetof(TAVO_THRES_WORKER, running_max) == 56);
-static_assert(offsetof(TAVO_THRES_WORKER, cond) == 88);
+static_assert(sizeof(void *) != 8 || offsetof(TAVO_THRES_WORKER, running_max) == 56);
+static_assert(sizeof(void *) != 8 || offsetof(TAVO_THRES_WORKER, cond) == 88);
 
 extern "C" {
 

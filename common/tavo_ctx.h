@@ -75,12 +75,18 @@ struct TAVO_CTX {
     int32_t seg_count;  // segments of the current plan, 1 or 4
 };
 
-static_assert(offsetof(TAVO_HL_CTX, power) == 8 && offsetof(TAVO_HL_CTX, hl_pos) == 20);
-static_assert(offsetof(TAVO_ONSET_CTX, beat_times) == 16 && sizeof(TAVO_ONSET_CTX) == 40);
-static_assert(offsetof(TAVO_CTX, pcm) == 8 && offsetof(TAVO_CTX, ana_rate) == 40);
-static_assert(offsetof(TAVO_CTX, fmt) == 56 && offsetof(TAVO_CTX, duration) == 72);
-static_assert(offsetof(TAVO_CTX, worker) == 104 && offsetof(TAVO_CTX, seg_count) == 128);
-static_assert(offsetof(TAVO_INFO, beat_times) == 8 && offsetof(TAVO_INFO, status) == 16);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_HL_CTX, power) == 8 && offsetof(TAVO_HL_CTX, hl_pos) == 20));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_ONSET_CTX, beat_times) == 16 && sizeof(TAVO_ONSET_CTX) == 40));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_CTX, pcm) == 8 && offsetof(TAVO_CTX, ana_rate) == 40));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_CTX, fmt) == 56 && offsetof(TAVO_CTX, duration) == 72));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_CTX, worker) == 104 && offsetof(TAVO_CTX, seg_count) == 128));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_INFO, beat_times) == 8 && offsetof(TAVO_INFO, status) == 16));
 
 // Access to a flag (state, quit) that one thread writes while another reads it without the lock.
 inline int32_t load_flag(const int32_t *flag) {

@@ -23,7 +23,7 @@ struct TAVO_FFT_CTX {
     uint32_t *bit_reverse;  // [N] the reversal of i where it is not below i, else 0
     int32_t stages;         // log2 N
 };
-static_assert(offsetof(TAVO_FFT_CTX, stages) == 24);
+static_assert(sizeof(void *) != 8 || offsetof(TAVO_FFT_CTX, stages) == 24);
 
 extern "C" {
 

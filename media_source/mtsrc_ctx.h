@@ -45,9 +45,11 @@ struct mtsrc_ctx {
     int32_t frm_buf_size;  // bytes of one compressed frame's buffer
     pthread_mutex_t lock;  // held by reset and deinit
 };
-static_assert(offsetof(mtsrc_ctx, io) == 48 && offsetof(mtsrc_ctx, format) == 176);
-static_assert(offsetof(mtsrc_ctx, codec) == 200 && offsetof(mtsrc_ctx, q_base) == 232);
-static_assert(offsetof(mtsrc_ctx, lock) == 280);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(mtsrc_ctx, io) == 48 && offsetof(mtsrc_ctx, format) == 176));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(mtsrc_ctx, codec) == 200 && offsetof(mtsrc_ctx, q_base) == 232));
+static_assert(sizeof(void *) != 8 || offsetof(mtsrc_ctx, lock) == 280);
 
 extern "C" {
 

@@ -32,8 +32,9 @@ struct mtsrc_io {
     char *path;               ///< the source's own copy, a 512-byte buffer
     uint64_t reserved_96[3];  ///< 0
 };
-static_assert(offsetof(mtsrc_io, size) == 56 && offsetof(mtsrc_io, fd) == 72);
-static_assert(offsetof(mtsrc_io, path) == 88 && sizeof(mtsrc_io) == 120);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(mtsrc_io, size) == 56 && offsetof(mtsrc_io, fd) == 72));
+static_assert(sizeof(void *) != 8 || (offsetof(mtsrc_io, path) == 88 && sizeof(mtsrc_io) == 120));
 
 extern "C" {
 

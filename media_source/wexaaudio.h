@@ -41,8 +41,10 @@ struct wexa_tags {
     uint64_t reserved_1776;
     void *last;
 };
-static_assert(offsetof(wexa_tags, text[8].data) == 200 && offsetof(wexa_tags, entry) == 240);
-static_assert(sizeof(wexa_tag_entry) == 96 && offsetof(wexa_tags, last) == 1784);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(wexa_tags, text[8].data) == 200 && offsetof(wexa_tags, entry) == 240));
+static_assert(sizeof(void *) != 8 ||
+              (sizeof(wexa_tag_entry) == 96 && offsetof(wexa_tags, last) == 1784));
 
 struct xwav_info {
     int32_t codec;  // kWexaPcm, or the file's own format tag
@@ -53,8 +55,9 @@ struct xwav_info {
     int64_t duration;
     int64_t reserved_40;
 };
-static_assert(offsetof(xwav_info, sample_rate) == 20 && offsetof(xwav_info, duration) == 32);
-static_assert(sizeof(xwav_info) == 48);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xwav_info, sample_rate) == 20 && offsetof(xwav_info, duration) == 32));
+static_assert(sizeof(void *) != 8 || sizeof(xwav_info) == 48);
 
 struct xaac_info {
     int32_t reserved_0[3];
@@ -65,8 +68,10 @@ struct xaac_info {
     int64_t duration;
     wexa_tags *tags;
 };
-static_assert(offsetof(xaac_info, sample_rate) == 12 && offsetof(xaac_info, channels) == 20);
-static_assert(offsetof(xaac_info, duration) == 40 && sizeof(xaac_info) == 56);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xaac_info, sample_rate) == 12 && offsetof(xaac_info, channels) == 20));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xaac_info, duration) == 40 && sizeof(xaac_info) == 56));
 
 struct xflac_info {
     int32_t reserved_0[2];
@@ -76,8 +81,10 @@ struct xflac_info {
     int64_t duration;
     wexa_tags *tags;
 };
-static_assert(offsetof(xflac_info, sample_rate) == 8 && offsetof(xflac_info, duration) == 56);
-static_assert(offsetof(xflac_info, tags) == 64 && sizeof(xflac_info) == 72);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xflac_info, sample_rate) == 8 && offsetof(xflac_info, duration) == 56));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xflac_info, tags) == 64 && sizeof(xflac_info) == 72));
 
 struct xmp123_info {
     int32_t reserved_0[2];
@@ -89,8 +96,10 @@ struct xmp123_info {
     int64_t duration;
     wexa_tags *tags;
 };
-static_assert(offsetof(xmp123_info, sample_rate) == 8 && offsetof(xmp123_info, channels) == 16);
-static_assert(offsetof(xmp123_info, duration) == 40 && sizeof(xmp123_info) == 56);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xmp123_info, sample_rate) == 8 && offsetof(xmp123_info, channels) == 16));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xmp123_info, duration) == 40 && sizeof(xmp123_info) == 56));
 
 constexpr int32_t kMp4Tracks = 64;  // room for kinds
 struct xmp4_info {
@@ -102,8 +111,10 @@ struct xmp4_info {
     wexa_tags *tags;
     int64_t reserved_704;
 };
-static_assert(offsetof(xmp4_info, kind) == 16 && offsetof(xmp4_info, duration) == 272);
-static_assert(offsetof(xmp4_info, tags) == 696 && sizeof(xmp4_info) == 712);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xmp4_info, kind) == 16 && offsetof(xmp4_info, duration) == 272));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xmp4_info, tags) == 696 && sizeof(xmp4_info) == 712));
 
 struct xmp4_track {
     int32_t reserved_0;
@@ -114,8 +125,10 @@ struct xmp4_track {
     int32_t channels;
     int64_t reserved_24[6];
 };
-static_assert(offsetof(xmp4_track, format_tag) == 4 && offsetof(xmp4_track, sample_rate) == 12);
-static_assert(offsetof(xmp4_track, channels) == 20 && sizeof(xmp4_track) == 72);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xmp4_track, format_tag) == 4 && offsetof(xmp4_track, sample_rate) == 12));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xmp4_track, channels) == 20 && sizeof(xmp4_track) == 72));
 
 constexpr int32_t kOggStreams = 16;  // room for kinds
 struct xogg_info {
@@ -126,8 +139,10 @@ struct xogg_info {
     int64_t duration;
     int64_t reserved_96;
 };
-static_assert(offsetof(xogg_info, stream_count) == 64 && offsetof(xogg_info, tags) == 80);
-static_assert(offsetof(xogg_info, duration) == 88 && sizeof(xogg_info) == 104);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xogg_info, stream_count) == 64 && offsetof(xogg_info, tags) == 80));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xogg_info, duration) == 88 && sizeof(xogg_info) == 104));
 
 struct xogg_stream {
     int32_t reserved_0;
@@ -136,8 +151,9 @@ struct xogg_stream {
     int32_t sample_rate;
     int64_t reserved_16[2];
 };
-static_assert(offsetof(xogg_stream, codec) == 4 && offsetof(xogg_stream, sample_rate) == 12);
-static_assert(sizeof(xogg_stream) == 32);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(xogg_stream, codec) == 4 && offsetof(xogg_stream, sample_rate) == 12));
+static_assert(sizeof(void *) != 8 || sizeof(xogg_stream) == 32);
 
 // Decoder configuration.
 struct wexa_config {
@@ -153,7 +169,7 @@ struct xaac_config {
     int32_t channels;
     int32_t word_7;  // 0
 };
-static_assert(sizeof(wexa_config) == 16 && sizeof(xaac_config) == 32);
+static_assert(sizeof(void *) != 8 || (sizeof(wexa_config) == 16 && sizeof(xaac_config) == 32));
 
 // One compressed frame, handed to a decoder.
 struct wexa_frame {
@@ -165,8 +181,9 @@ struct wexa_frame {
     int32_t reserved_28;
     uint64_t reserved_32[8];
 };
-static_assert(offsetof(wexa_frame, bytes) == 16 && offsetof(wexa_frame, codec) == 24);
-static_assert(sizeof(wexa_frame) == 96);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(wexa_frame, bytes) == 16 && offsetof(wexa_frame, codec) == 24));
+static_assert(sizeof(void *) != 8 || sizeof(wexa_frame) == 96);
 
 // What a decoder wrote: bytes of interleaved 16-bit PCM at data, which the caller sets.
 struct wexa_output {
@@ -176,21 +193,22 @@ struct wexa_output {
     void *data;
     uint8_t reserved_72[200];
 };
-static_assert(offsetof(wexa_output, bytes) == 32 && offsetof(wexa_output, data) == 64);
-static_assert(sizeof(wexa_output) == 272);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(wexa_output, bytes) == 32 && offsetof(wexa_output, data) == 64));
+static_assert(sizeof(void *) != 8 || sizeof(wexa_output) == 272);
 
 struct wexa_status {
     int32_t produced;  // not 0 when the decode gave PCM
     int32_t reserved_4[7];
 };
-static_assert(sizeof(wexa_status) == 32);
+static_assert(sizeof(void *) != 8 || sizeof(wexa_status) == 32);
 
 struct xaac_stream_info {
     int32_t word_0;
     int32_t sample_rate;
     int32_t reserved_8[14];
 };
-static_assert(offsetof(xaac_stream_info, sample_rate) == 4);
+static_assert(sizeof(void *) != 8 || offsetof(xaac_stream_info, sample_rate) == 4);
 
 // The FLAC source sets the byte at this offset of the reader's own state to 1 before every read.
 constexpr size_t kFlacReaderFlag = 2096;

@@ -31,8 +31,10 @@ struct TAVO_DECSEG {
     pthread_mutex_t *mutex;  // ext_mutex_mt
     pthread_cond_t *cond;    // ext_cond_mt
 };
-static_assert(offsetof(TAVO_DECSEG, src) == 16 && offsetof(TAVO_DECSEG, duration) == 48);
-static_assert(offsetof(TAVO_DECSEG, got) == 72 && offsetof(TAVO_DECSEG, cond) == 120);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_DECSEG, src) == 16 && offsetof(TAVO_DECSEG, duration) == 48));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_DECSEG, got) == 72 && offsetof(TAVO_DECSEG, cond) == 120));
 
 extern "C" {
 

@@ -37,9 +37,10 @@ struct RESAMPLE_PART {
     pthread_mutex_t *mutex;  // ext_mutex_resample
     pthread_cond_t *cond;    // ext_cond_resample
 };
-static_assert(offsetof(dorn_resampler_state, coef) == 12);
-static_assert(offsetof(RESAMPLE_PART, first) == 32 && offsetof(RESAMPLE_PART, done) == 72);
-static_assert(offsetof(RESAMPLE_PART, cond) == 96);
+static_assert(sizeof(void *) != 8 || offsetof(dorn_resampler_state, coef) == 12);
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(RESAMPLE_PART, first) == 32 && offsetof(RESAMPLE_PART, done) == 72));
+static_assert(sizeof(void *) != 8 || offsetof(RESAMPLE_PART, cond) == 96);
 
 extern "C" {
 
