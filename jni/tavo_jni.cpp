@@ -181,17 +181,14 @@ jint init_failed(jint code) {
     return code;
 }
 
-// Under the lock.
-jint init_locked(JNIEnv *env, jstring path, jint mode) {
-    if (load_pointer(&instance) != nullptr) return already_opened();
-    const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
-    if (chars == nullptr) {
-        env->ExceptionClear();
-        return init_failed(TAVO_ERR_HANDLE);
-    }
-    int32_t err = TAVO_OK;
-    TAVO_CTX *ctx = create_instance(chars, mode, &err);
-    env->ReleaseStringUTFChars(path, chars);
+// Under the lock. chars: of path, or null; given back here.
+jint init_locked(JNIEnv *env, jstring path, const char *chars, jint mode) {
+    const bool is_open = load_pointer(&instance) != nullptr;
+    int32_t err = TAVO_ERR_HANDLE;
+    TAVO_CTX *ctx = nullptr;
+    if (!is_open && chars != nullptr) ctx = create_instance(chars, mode, &err);
+    if (chars != nullptr) env->ReleaseStringUTFChars(path, chars);
+    if (is_open) return already_opened();
     if (ctx != nullptr) err = adopt_instance(env, ctx);
     if (err != TAVO_OK) return init_failed(err);
     __android_log_print(ANDROID_LOG_VERBOSE, kTag, "tavo_init and setcallback is finished");
@@ -283,10 +280,14 @@ JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *vm, void * /*reserved*/) {
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobject thiz,
                                                               jobject obj) {
     jclass host_class = env->GetObjectClass(thiz);
-    host_refs *host = host_class != nullptr ? make_host(env, host_class, obj) : nullptr;
-    if (host_class != nullptr) env->DeleteLocalRef(host_class);
-    if (host == nullptr) {
+    if (host_class == nullptr) {
         __android_log_print(ANDROID_LOG_ERROR, kTag, "Can't find com/kestu/tavo/Tavo");
+        env->ExceptionClear();
+        return;
+    }
+    host_refs *host = make_host(env, host_class, obj);
+    env->DeleteLocalRef(host_class);
+    if (host == nullptr) {  // out of memory: the earlier host stays
         env->ExceptionClear();
         return;
     }
@@ -299,10 +300,12 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobje
 
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject /*thiz*/, jstring path,
                                                      jint mode) {
+    const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
+    if (chars == nullptr) env->ExceptionClear();
     // Inside an event: a deinit that waits for this thread may hold the lock.
-    if (is_posting() && load_pointer(&instance) != nullptr) return already_opened();
-    pthread_mutex_t *mutex = lock_for_init();
-    const jint result = init_locked(env, path, mode);
+    const bool takes_lock = !is_posting() || load_pointer(&instance) == nullptr;
+    pthread_mutex_t *mutex = takes_lock ? lock_for_init() : nullptr;
+    const jint result = init_locked(env, path, chars, mode);
     unlock(mutex);
     return result;
 }

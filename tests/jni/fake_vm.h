@@ -91,6 +91,7 @@ JNINativeInterface_ functions() {
         return give("GetStringUTFChars", &lent) != nullptr ? characters.c_str() : nullptr;
     };
     table.ReleaseStringUTFChars = [](JNIEnv *, jstring, const char *) {
+        fails("ReleaseStringUTFChars");
         characters.clear();
         --lent;
     };

@@ -81,16 +81,24 @@ TEST(JniFirstCalls, EachIsHarmlessAndMakesWhatItNeeds) {
     EXPECT_EQ(now.log_lines, kNotNotified + kNoInstance);
     EXPECT_EQ(tavo_jni_mutex, nullptr);
 
-    // A lock that is there already is used, not replaced.
+    // An existing lock is used, not replaced: free while the characters are asked for, held when
+    // they are given back.
     pthread_mutex_t own = PTHREAD_MUTEX_INITIALIZER;
     tavo_jni_mutex = &own;
-    const auto is_locked = [&own] { EXPECT_EQ(pthread_mutex_trylock(&own), EBUSY); };
-    now = {"", 0, "GetStringUTFChars", is_locked};
+    std::vector<int> trials;
+    const auto try_lock = [&] {
+        trials.push_back(pthread_mutex_trylock(&own));
+        if (trials.back() == 0) pthread_mutex_unlock(&own);
+    };
+    now = {"", 0, "GetStringUTFChars", try_lock};
     EXPECT_EQ(init("/nowhere.wav"), -4);
+    now.watched = "ReleaseStringUTFChars";
+    EXPECT_EQ(init("/nowhere.wav"), -4);
+    EXPECT_EQ(trials, (std::vector<int>{0, EBUSY}));
     tavo_jni_mutex = nullptr;
     EXPECT_EQ(init(nullptr), -4);
     EXPECT_NE(tavo_jni_mutex, nullptr);
-    EXPECT_EQ(now.log_lines, kUnusable + kUnusable);
+    EXPECT_EQ(now.log_lines, kUnusable + kUnusable + kUnusable);
     expect_held(2);
 }
 
@@ -136,8 +144,8 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
         {"", 0, {29980, 0, nullptr, -1}, kOpened, {2, 29980, 0}},
         {"", 0, {0, 120, times.data(), -1}, kOpened, {2, 0, 0}},
         {"GetObjectClass", 1, both, kNoHost + kOpened, result},
-        {"NewGlobalRef", 1, both, kNoHost + kOpened, result},
-        {"NewGlobalRef", 2, both, kNoHost + kOpened, result},
+        {"NewGlobalRef", 1, both, kOpened, result},
+        {"NewGlobalRef", 2, both, kOpened, result},
         {"GetStringUTFChars", 1, both, kUnusable, none},
         {"FindClass", 1, both, kUnusable, none},
         {"GetStaticMethodID", 1, both, kUnusable, none},
