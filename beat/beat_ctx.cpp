@@ -1,7 +1,7 @@
 #include "beat/beat_ctx.h"
 
+#include "common/lanes.h"
 #include "common/worker_group.h"
-#include "dsp/lanes.h"
 #include "dsp/mel.h"
 
 pthread_mutex_t *feat_mutex_mt = nullptr;

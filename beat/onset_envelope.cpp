@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cmath>
 
-#include "dsp/lanes.h"
+#include "common/lanes.h"
 #include "dsp/stats.h"
 
 namespace {

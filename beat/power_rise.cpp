@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cmath>
 
-#include "dsp/lanes.h"
+#include "common/lanes.h"
 #include "dsp/sort.h"
 
 namespace {

@@ -3,19 +3,44 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
+#include <algorithm>
+
 namespace {
 
-constexpr int64_t kHugeAdviceBytes = 4 << 20;  // two huge pages of most systems
+constexpr int64_t kHugePageBytes = 2 << 20;  // of most systems
+
+uintptr_t page_size() {
+    return static_cast<uintptr_t>(sysconf(_SC_PAGESIZE));
+}
 
 }  // namespace
 
 void advise_huge_pages(void *buffer, int64_t bytes) {
-    if (buffer == nullptr || bytes < kHugeAdviceBytes) return;
+    if (buffer == nullptr || bytes < kLargeBytes) return;
     // Outwards to whole pages: neighbouring buffers then share huge pages, and each stays one
     // mapping, which realloc can move. The advice does not change what else the first and last page
     // hold.
-    const auto page = static_cast<uintptr_t>(sysconf(_SC_PAGESIZE));
+    const uintptr_t page = page_size();
     const uintptr_t before = reinterpret_cast<uintptr_t>(buffer) % page;
     const uintptr_t pages = (before + static_cast<uintptr_t>(bytes) + page - 1) / page;
     madvise(static_cast<uint8_t *>(buffer) - before, pages * page, MADV_HUGEPAGE);
+}
+
+uint8_t *allocate_buffer(int64_t bytes) {
+    // At least one byte: an empty request may be answered by null.
+    const auto size = static_cast<size_t>(std::max<int64_t>(bytes, 1));
+    if (bytes < kLargeBytes) return static_cast<uint8_t *>(malloc(size));
+    void *buffer = nullptr;
+    if (posix_memalign(&buffer, kHugePageBytes, size) != 0) return nullptr;
+    advise_huge_pages(buffer, bytes);
+    return static_cast<uint8_t *>(buffer);
+}
+
+const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end) {
+    const uintptr_t page = page_size();
+    const uintptr_t first = (reinterpret_cast<uintptr_t>(begin) + page - 1) / page * page;
+    const uintptr_t last = reinterpret_cast<uintptr_t>(end) / page * page;
+    if (first >= last) return begin;
+    madvise(reinterpret_cast<void *>(first), last - first, MADV_DONTNEED);
+    return reinterpret_cast<const uint8_t *>(last);
 }

@@ -40,8 +40,20 @@ T *zeroed_items(int64_t count) {
     return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
 }
 
-// Asks for huge pages under a buffer of 4 MiB or more that is about to be filled: one page fault
-// instead of 512, a fifth of the time. Other systems may not grant them; nothing else changes.
+constexpr int64_t kLargeBytes = 4 << 20;  // from here on pages are worth the calls below
+
+// Asks for huge pages under a large buffer that is about to be filled: one page fault instead of
+// 512, a fifth of the time. Other systems may not grant them; nothing else changes.
 void advise_huge_pages(void *buffer, int64_t bytes);
+
+// Uninitialised memory, at least one byte; the caller's to free. A large buffer begins at a huge
+// page, so that the allocator's header before it does not break up the first one. Null if memory
+// runs out.
+uint8_t *allocate_buffer(int64_t bytes);
+
+// Gives the whole pages from begin to end back to the system. They stay allocated and read as
+// zeros; begin and end are in one buffer of the heap. Returns the end of the last page released, or
+// begin if there was none.
+const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end);
 
 #endif

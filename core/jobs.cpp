@@ -2,13 +2,20 @@
 
 #include "beat/beats.h"
 #include "highlight/position.h"
-#include "pcm/song.h"
+#include "pcm/decode.h"
+#include "pcm/from_highlight.h"
+#include "pcm/resample.h"
 
 namespace {
 
 // TAVO_INFO.status
 constexpr int32_t kStatusResult = 0;
 constexpr int32_t kStatusFailure = -1;
+
+// The first step of every job.
+void decode(TAVO_CTX *ctx) {
+    ctx->pcm_bytes = decode_segments(ctx, ctx->pcm, ctx->pcm_bytes, segment_pages::released);
+}
 
 void deliver(TAVO_CTX *ctx) {
     if (ctx->callback != nullptr) ctx->callback(ctx->info);
@@ -46,7 +53,7 @@ void find_and_report_beats(TAVO_CTX *ctx, bool from_highlight, bool converted) {
 
 extern "C" void *analyzeHighlightOnly(void *arg) {
     auto *ctx = static_cast<TAVO_CTX *>(arg);
-    decode_song(ctx);
+    decode(ctx);
     getHLPosition(ctx);
     store_flag(&ctx->state, kStateFinished);
     ctx->info->hl_pos = static_cast<int32_t>(ctx->hl->hl_pos);
@@ -61,17 +68,19 @@ extern "C" void *analyzeHighlight(void *arg) {
 
 extern "C" void *analyzeOnsetOnly(void *arg) {
     auto *ctx = static_cast<TAVO_CTX *>(arg);
-    decode_song(ctx);
-    const int32_t code = convert_song(ctx, 0);
+    decode(ctx);
+    const int32_t code = convert_and_free(ctx->pcm, ctx->pcm_bytes, ctx->fmt.sample_rate,
+                                          ctx->ana_rate, &ctx->ana_len, &ctx->ana);
+    ctx->pcm = nullptr;
     find_and_report_beats(ctx, false, code == 0);
     pthread_exit(nullptr);
 }
 
 extern "C" void *analyzeOnsetFromeHi(void *arg) {
     auto *ctx = static_cast<TAVO_CTX *>(arg);
-    decode_song(ctx);
+    decode(ctx);
     const int64_t start_ms = getHLPosition(ctx);
-    const int32_t code = start_song_at(ctx, start_ms);
+    const int32_t code = continue_from_highlight(ctx, start_ms, segment_pages::released);
     find_and_report_beats(ctx, true, code == 0);
     pthread_exit(nullptr);
 }

@@ -1,18 +1,4 @@
-#include "common/alloc.h"
-#include "common/limits.h"
-#include "media_source/mtsrc.h"
-
-namespace {
-
-// The reason why a stream that a media source can deliver is not analysed, or TAVO_OK.
-int32_t check_stream(const mtsrc_format &format) {
-    int64_t bytes = 0;
-    if (format.duration <= kRefusedUnits) return TAVO_ERR_SHORT;
-    if (format.sample_rate < kMinRate) return TAVO_ERR_LOW_RATE;
-    return span_bytes(format.duration, format.sample_rate, &bytes) ? TAVO_OK : TAVO_ERR_FORMAT;
-}
-
-}  // namespace
+#include "pcm/decode_plan.h"
 
 extern "C" int32_t tavo_probe(const char *path, TAVO_STREAM *stream) {
     if (stream != nullptr) *stream = {};

@@ -6,7 +6,7 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "dsp/lanes.h"
+#include "common/lanes.h"
 
 constexpr double kTwoPi = 6.283185307179586;
 constexpr int32_t kMaxFftSize = 16384;  // the largest power of two in 16 bits

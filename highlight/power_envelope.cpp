@@ -3,7 +3,7 @@
 #include <cmath>
 #include <cstdlib>
 
-#include "dsp/lanes.h"
+#include "common/lanes.h"
 
 namespace {
 

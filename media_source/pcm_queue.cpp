@@ -40,14 +40,49 @@ int32_t fill_to(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill
     return TAVO_OK;
 }
 
-int16_t load(const uint8_t *pcm, int64_t sample) {
-    int16_t value;
-    memcpy(&value, pcm + sample * kBytesPerSample, sizeof value);
-    return value;
-}
+constexpr int32_t kRunFrames = 64;  // reduced at once, in loops of fixed length for the vectoriser
 
-void store(uint8_t *pcm, int64_t sample, int16_t value) {
-    memcpy(pcm + sample * kBytesPerSample, &value, sizeof value);
+struct left_of {
+    static void reduce(const int16_t *stereo, int16_t *mono) {
+        for (int32_t j = 0; j < kRunFrames; ++j) mono[j] = stereo[2 * j];
+    }
+    static int16_t reduce_one(const int16_t *frame) { return frame[0]; }
+};
+
+struct mean_of {
+    static void reduce(const int16_t *stereo, int16_t *mono) {
+        for (int32_t j = 0; j < kRunFrames; ++j) {
+            mono[j] = static_cast<int16_t>((stereo[2 * j] + stereo[2 * j + 1]) / 2);
+        }
+    }
+    static int16_t reduce_one(const int16_t *frame) {
+        return static_cast<int16_t>((frame[0] + frame[1]) / 2);
+    }
+};
+
+// The body of pcm_first_channel and pcm_mean_of_two. A run is read before it is written.
+template <typename reduction>
+int32_t reduce_pcm(uint8_t *to, const uint8_t *from, int32_t bytes, int32_t channels) {
+    if (channels <= 1) {
+        memmove(to, from, static_cast<size_t>(bytes));
+        return bytes;
+    }
+    const int64_t count = bytes / kBytesPerSample / channels;
+    int64_t j = 0;
+    for (; channels == 2 && j + kRunFrames <= count; j += kRunFrames) {
+        int16_t stereo[2 * kRunFrames];
+        int16_t mono[kRunFrames];
+        memcpy(stereo, from + j * 2 * kBytesPerSample, sizeof stereo);
+        reduction::reduce(stereo, mono);
+        memcpy(to + j * kBytesPerSample, mono, sizeof mono);
+    }
+    for (; j < count; ++j) {
+        int16_t frame[2];
+        memcpy(frame, from + j * channels * kBytesPerSample, sizeof frame);
+        const int16_t mono = reduction::reduce_one(frame);
+        memcpy(to + j * kBytesPerSample, &mono, sizeof mono);
+    }
+    return bytes / channels;
 }
 
 }  // namespace
@@ -80,24 +115,9 @@ int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pc
 }
 
 int32_t pcm_first_channel(uint8_t *to, const uint8_t *from, int32_t bytes, int32_t channels) {
-    if (channels <= 1) {
-        memmove(to, from, static_cast<size_t>(bytes));
-        return bytes;
-    }
-    const int32_t count = bytes / kBytesPerSample / channels;
-    for (int64_t j = 0; j < count; ++j) store(to, j, load(from, j * channels));
-    return bytes / channels;
+    return reduce_pcm<left_of>(to, from, bytes, channels);
 }
 
 int32_t pcm_mean_of_two(uint8_t *to, const uint8_t *from, int32_t bytes, int32_t channels) {
-    if (channels <= 1) {
-        memmove(to, from, static_cast<size_t>(bytes));
-        return bytes;
-    }
-    const int32_t count = bytes / kBytesPerSample / channels;
-    for (int64_t j = 0; j < count; ++j) {
-        const int32_t sum = load(from, j * channels) + load(from, j * channels + 1);
-        store(to, j, static_cast<int16_t>(sum / 2));
-    }
-    return bytes / channels;
+    return reduce_pcm<mean_of>(to, from, bytes, channels);
 }

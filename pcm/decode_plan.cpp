@@ -1,10 +1,11 @@
+#include "pcm/decode_plan.h"
+
 #include <algorithm>
 #include <cstdlib>
 
 #include "common/alloc.h"
 #include "common/limits.h"
 #include "common/worker_group.h"
-#include "pcm/decode.h"
 #include "pcm/read_pcm.h"
 
 pthread_mutex_t *ext_mutex_mt = nullptr;
@@ -14,7 +15,7 @@ namespace {
 
 constexpr int64_t kSingleThreadUnits = 50'000'000;  // up to 5 s one thread is enough
 constexpr int32_t kParallelSegments = 4;
-constexpr int64_t kOverlapUnits = 20'000'000;  // decoded beyond a segment's share, for the seam
+constexpr int64_t kOverlapUnits = 20'000'000;  // decoded beyond a segment's end, for the splice
 
 int32_t segments_for(int64_t units) {
     return units > kSingleThreadUnits ? kParallelSegments : 1;
@@ -25,7 +26,7 @@ int32_t table_size(const TAVO_CTX *ctx) {
     return std::max(ctx->seg_count, segments_for(ctx->duration));
 }
 
-// Learns format and duration from a source that is closed again.
+// Reads format and duration from a source that is closed again.
 int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     int32_t err = 0;
     mtsrc_ctx *probe = mtsrc_init(open_param, &err);
@@ -34,32 +35,25 @@ int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     const int32_t result = mtsrc_getstream_format(probe, &format);
     mtsrc_deinit(probe);
 
-    int64_t bytes = 0;
-    if (result != 0 || format.duration <= kRefusedUnits || format.sample_rate < kMinRate ||
-        !span_bytes(format.duration, format.sample_rate, &bytes)) {
-        return TAVO_ERR_FORMAT;
-    }
+    if (result != 0 || check_stream(format) != TAVO_OK) return TAVO_ERR_FORMAT;
     ctx->fmt = {format.sample_rate, format.channels, format.bits};
     ctx->duration = format.duration;
     return 0;
 }
 
-// Gives a segment of the current plan a buffer and moves its source to start.
-int32_t place_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_len) {
+// Gives a segment of the current plan its length and a buffer, and moves its source to start.
+int32_t plan_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_len) {
     TAVO_DECSEG *seg = &ctx->seg[index];
     const int32_t count = ctx->seg_count;
     const bool last = index == count - 1;
     seg->index = index;
     seg->count = count;
     seg->start = start;
-    seg->got = 0;
     if (!span_bytes(last ? seg_len : seg_len + kOverlapUnits, ctx->fmt.sample_rate, &seg->cap)) {
         return TAVO_ERR_MEMORY;
     }
-    // At least one byte: an empty request may be answered by null.
-    seg->buf = static_cast<uint8_t *>(malloc(static_cast<size_t>(std::max<int64_t>(seg->cap, 1))));
+    seg->buf = allocate_buffer(seg->cap);
     if (seg->buf == nullptr) return TAVO_ERR_MEMORY;
-    advise_huge_pages(seg->buf, seg->cap);
 
     seg->seek_pos = start;  // kept when the seek fails without reporting a position
     mtsrc_seekstream(seg->src, start, &seg->seek_pos);
@@ -67,18 +61,19 @@ int32_t place_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_l
 }
 
 // Allocates the cleared PCM buffer for units of stream.
-int32_t make_pcm(TAVO_CTX *ctx, int64_t units) {
+int32_t allocate_pcm(TAVO_CTX *ctx, int64_t units) {
     int64_t bytes = 0;
-    if (!span_bytes(units, ctx->fmt.sample_rate, &bytes) || bytes == 0) return TAVO_ERR_MEMORY;
+    if (!span_bytes(units, ctx->fmt.sample_rate, &bytes)) return TAVO_ERR_MEMORY;
+    ctx->pcm_bytes = bytes;
+    if (bytes == 0) return TAVO_ERR_MEMORY;
     ctx->pcm = static_cast<int16_t *>(calloc(static_cast<size_t>(bytes), 1));
     if (ctx->pcm == nullptr) return TAVO_ERR_MEMORY;
     advise_huge_pages(ctx->pcm, bytes);
-    ctx->pcm_bytes = bytes;
     return 0;
 }
 
 // The table of seg_count cleared records that share one array of done flags.
-int32_t make_table(TAVO_CTX *ctx, const mtsrc_param *open_param) {
+int32_t allocate_table(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     ctx->seg = zeroed_items<TAVO_DECSEG>(ctx->seg_count);
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
     auto *done = zeroed_items<int32_t>(ctx->seg_count);
@@ -103,7 +98,7 @@ int32_t build_decoding(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     if (err != 0) return err;
 
     ctx->seg_count = segments_for(ctx->duration);
-    err = make_table(ctx, open_param);
+    err = allocate_table(ctx, open_param);
     if (err != 0) return err;
 
     const int64_t seg_len = ctx->duration / ctx->seg_count;
@@ -112,20 +107,27 @@ int32_t build_decoding(TAVO_CTX *ctx, const mtsrc_param *open_param) {
         err = TAVO_ERR_HANDLE;
         seg->src = mtsrc_init(&seg->open_param, &err);
         if (seg->src == nullptr) return err;
-        err = place_segment(ctx, i, i * seg_len, seg_len);
+        err = plan_segment(ctx, i, i * seg_len, seg_len);
         if (err != 0) return err;
     }
-    return make_pcm(ctx, ctx->duration);
+    return allocate_pcm(ctx, ctx->duration);
 }
 
 }  // namespace
+
+int32_t check_stream(const mtsrc_format &format) {
+    int64_t bytes = 0;
+    if (format.duration <= kRefusedUnits) return TAVO_ERR_SHORT;
+    if (format.sample_rate < kMinRate) return TAVO_ERR_LOW_RATE;
+    return span_bytes(format.duration, format.sample_rate, &bytes) ? TAVO_OK : TAVO_ERR_FORMAT;
+}
 
 int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param) {
     const mtsrc_param open_param = {param->path};
     ctx->seg = nullptr;
     ctx->pcm = nullptr;
     ctx->seg_count = 0;
-    clear_read_failure();
+    clear_read_failed();
     const int32_t err = build_decoding(ctx, &open_param);
     if (err != 0) tavo_decode_deinit(ctx);
     return err;
@@ -148,25 +150,23 @@ void tavo_decode_deinit(TAVO_CTX *ctx) {
 }
 
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start) {
+    // The caller has freed these. The pointers go before anything can fail, so that no release
+    // frees them again.
     ctx->pcm = nullptr;
-    ctx->pcm_bytes = 0;
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
-    // The caller has freed the buffers. Their pointers go before anything can fail, so that no
-    // release frees them again.
-    const int32_t records = table_size(ctx);
-    for (int32_t i = 0; i < records; ++i) ctx->seg[i].buf = nullptr;
+    for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].buf = nullptr;
 
     int64_t rest = 0;
     if (__builtin_sub_overflow(ctx->duration, start, &rest) || rest < 0) return TAVO_ERR_MEMORY;
     // With a start below 0 the rest may ask for more segments than the table has records.
-    ctx->seg_count = std::min(segments_for(rest), records);
+    ctx->seg_count = std::min(segments_for(rest), table_size(ctx));
     const int64_t seg_len = rest / ctx->seg_count;
     int32_t err = 0;
     for (int32_t i = 0; i < ctx->seg_count && err == 0; ++i) {
-        err = place_segment(ctx, i, start + i * seg_len, seg_len);
+        err = plan_segment(ctx, i, start + i * seg_len, seg_len);
     }
-    if (err == 0) err = make_pcm(ctx, rest);
-    for (int32_t i = 0; i < records && err != 0; ++i) {
+    if (err == 0) err = allocate_pcm(ctx, rest);
+    for (int32_t i = 0; i < ctx->seg_count && err != 0; ++i) {
         free(ctx->seg[i].buf);
         ctx->seg[i].buf = nullptr;
     }

@@ -2,56 +2,62 @@
 
 #include <algorithm>
 #include <cstdlib>
+#include <cstring>
 
 #include "common/alloc.h"
 #include "pcm/block_search.h"
 #include "pcm/read_pcm.h"
-#include "pcm/song.h"
-#include "pcm/stitch.h"
+#include "pcm/resample.h"
 
 namespace {
 
 constexpr int64_t kFirstSeekMs = 1001;  // an earlier highlight is the beginning of the file
 constexpr float kMsPerSecond = 1000.0f;
 
-// The probe is PCM decoded afresh from the landing point. Its block lies so far in that a decoder
-// that has just been positioned has settled.
+// The probe is PCM decoded afresh from the seek position. Its block starts so late that a decoder
+// that has just been positioned delivers what it delivers in mid-stream.
 constexpr int64_t kProbeBytes = 8192;
-constexpr int64_t kProbeBlockAt = 4608;
+constexpr int64_t kProbeBlockOffset = 4608;
 
-// Seconds of PCM searched before and after the expected place.
+// Seconds of PCM searched before and after the expected offset.
 constexpr int64_t kSecondsBefore = 1;
 constexpr int64_t kSecondsAfter = 3;
 
-constexpr int64_t kUnknownBytes = INT64_MAX;  // size of a PCM buffer that no record tells
+constexpr int64_t kUnknownBytes = INT64_MAX;  // size of a PCM buffer that no record states
 
-// Where the probe's block may lie in PCM of pcm_bytes bytes when the landing point is expected at
-// byte expected.
-place_range search_range(int64_t expected, int32_t rate, int64_t pcm_bytes) {
+// Offsets of the probe's block in PCM of pcm_bytes bytes, if the seek position is expected at byte
+// expected.
+offset_range search_range(int64_t expected, int32_t rate, int64_t pcm_bytes) {
     const int64_t second = std::max<int64_t>(second_bytes(rate), 0);
     const int64_t before = second * kSecondsBefore;
     const int64_t after = second * kSecondsAfter;
-    // The landing point must not lie before the buffer. No sum here can overflow.
-    const int64_t first = expected < before + kProbeBlockAt ? kProbeBlockAt : expected - before;
+    // The seek position must not be before the buffer. No sum here can overflow.
+    const int64_t first =
+        expected < before + kProbeBlockOffset ? kProbeBlockOffset : expected - before;
     const int64_t end = expected > pcm_bytes - after ? pcm_bytes : expected + after;
     return {first, std::min(end, pcm_bytes - kBlockBytes + 1)};
 }
 
 // Finds in pcm the audio that the source delivers next. *off: bytes, in the expected offset of that
 // audio, out the offset found. Returns 0 found, -1 not, with *off unchanged.
-int32_t find_landing(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_t pcm_bytes,
-                     int64_t *off) {
+int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_t pcm_bytes,
+                        int64_t *off) {
     auto *probe = static_cast<uint8_t *>(malloc(kProbeBytes));
-    if (probe == nullptr) return -1;
+    if (probe == nullptr) {
+        mark_read_failed();  // a second decoding may give other beats
+        return -1;
+    }
 
-    int64_t place = kNoPlace;
-    if (read_pcm(src, probe, kProbeBytes) >= kProbeBlockAt + kBlockBytes) {
-        place = find_lowest(reinterpret_cast<const uint8_t *>(pcm),
-                            search_range(*off, rate, pcm_bytes), probe + kProbeBlockAt);
+    int64_t found = kNotFound;
+    int64_t bytes = 0;
+    read_pcm(src, probe, kProbeBytes, &bytes);
+    if (bytes >= kProbeBlockOffset + kBlockBytes) {
+        found = find_lowest(reinterpret_cast<const uint8_t *>(pcm),
+                            search_range(*off, rate, pcm_bytes), probe + kProbeBlockOffset);
     }
     free(probe);
-    if (place == kNoPlace) return -1;
-    *off = place - kProbeBlockAt;
+    if (found == kNotFound) return -1;
+    *off = found - kProbeBlockOffset;
     return 0;
 }
 
@@ -65,26 +71,24 @@ int64_t planned_bytes(const TAVO_DECSEG *seg) {
     return span_bytes(units, seg->fmt.sample_rate, &bytes) ? bytes : 0;
 }
 
-// Discards the decoding and decodes the stream again from start (100-ns units). keep: whether the
-// segments' buffers stay allocated.
-int32_t decode_again(TAVO_CTX *ctx, int64_t start, bool keep) {
-    for (int32_t i = 0; i < ctx->seg_count; ++i) free_segment_buffer(&ctx->seg[i]);
+// Discards the decoding and decodes the stream again from start (100-ns units).
+int32_t decode_again(TAVO_CTX *ctx, int64_t start, segment_pages pages) {
+    for (int32_t i = 0; i < ctx->seg_count; ++i) {
+        free(ctx->seg[i].buf);
+        ctx->seg[i].buf = nullptr;
+    }
     free(ctx->pcm);
     ctx->pcm = nullptr;
 
     const int32_t err = construct_decbuf(ctx, start);
     if (err != 0) return err;
-    if (keep) {
-        ctx->pcm_bytes = DecodePcmMT(ctx, ctx->pcm, ctx->pcm_bytes);
-    } else {
-        decode_song(ctx);
-    }
+    ctx->pcm_bytes = decode_segments(ctx, ctx->pcm, ctx->pcm_bytes, pages);
     return 0;
 }
 
-// Seeks to pos (milliseconds), stores the landing point as the highlight and finds it in the
-// decoded PCM, or decodes from there. *off: bytes of pcm before the landing point.
-int32_t settle_start(TAVO_CTX *ctx, int64_t pos, bool keep, int64_t *off) {
+// Seeks to pos (milliseconds), stores the position reached as the highlight and finds it in the
+// decoded PCM, or decodes from there. *off: bytes of pcm before that position.
+int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t *off) {
     mtsrc_ctx *src = ctx->seg[0].src;
     const int32_t rate = ctx->fmt.sample_rate;
     int64_t reached = 0;
@@ -93,36 +97,45 @@ int32_t settle_start(TAVO_CTX *ctx, int64_t pos, bool keep, int64_t *off) {
     mtsrc_seekstream(src, reached, &reached);
     ctx->hl->hl_pos = static_cast<uint32_t>(reached / kUnitsPerMs);
 
-    // float on purpose, in this order: the expected place is single precision
+    // float on purpose, in this order: the expected offset is single precision
     const float seconds = static_cast<float>(ctx->hl->hl_pos) / kMsPerSecond;
     *off = static_cast<int64_t>(seconds * 2.0f * static_cast<float>(rate));
-    if (find_landing(src, rate, ctx->pcm, ctx->pcm_bytes, off) == 0) return 0;
+    if (find_next_audio(src, rate, ctx->pcm, ctx->pcm_bytes, off) == 0) return 0;
 
     *off = 0;
-    return decode_again(ctx, reached, keep);
+    return decode_again(ctx, reached, pages);
 }
 
-int32_t start_at(TAVO_CTX *ctx, int64_t pos, bool keep) {
-    int64_t off = 0;
-    int32_t err = 0;
-    if (pos < kFirstSeekMs) {
-        ctx->hl->hl_pos = 0;
-    } else {
-        err = settle_start(ctx, pos, keep, &off);
+// Converts pcm without its first off bytes, and frees it.
+int32_t convert_rest(TAVO_CTX *ctx, int64_t off) {
+    int16_t *pcm = ctx->pcm;
+    const int64_t bytes = pcm == nullptr ? 0 : std::max<int64_t>(ctx->pcm_bytes - off, 0);
+    ctx->pcm = nullptr;
+    // To the front of the memory, where samples can be read whatever the offset.
+    if (off > 0 && bytes > 0) {
+        memmove(pcm, reinterpret_cast<const uint8_t *>(pcm) + off, static_cast<size_t>(bytes));
     }
-    return err == 0 ? convert_song(ctx, off) : err;
+    return convert_and_free(pcm, bytes, ctx->fmt.sample_rate, ctx->ana_rate, &ctx->ana_len,
+                            &ctx->ana);
 }
 
 }  // namespace
 
 int32_t _compare_decoded(TAVO_DECSEG *seg, const int16_t *pcm, int64_t *off) {
-    return find_landing(seg->src, seg->fmt.sample_rate, pcm, planned_bytes(seg), off);
+    return find_next_audio(seg->src, seg->fmt.sample_rate, pcm, planned_bytes(seg), off);
+}
+
+int32_t continue_from_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages) {
+    int64_t off = 0;
+    int32_t err = 0;
+    if (pos < kFirstSeekMs) {
+        ctx->hl->hl_pos = 0;
+    } else {
+        err = seek_highlight(ctx, pos, pages, &off);
+    }
+    return err == 0 ? convert_rest(ctx, off) : err;
 }
 
 int32_t tavo_get_from_here(TAVO_CTX *ctx, int64_t pos) {
-    return start_at(ctx, pos, true);
-}
-
-int32_t start_song_at(TAVO_CTX *ctx, int64_t pos) {
-    return start_at(ctx, pos, false);
+    return continue_from_highlight(ctx, pos, segment_pages::kept);
 }

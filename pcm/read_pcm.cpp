@@ -18,29 +18,32 @@ bool is_failure(int32_t result) {
 
 }  // namespace
 
-int64_t read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity) {
-    int64_t got = 0;
+void read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity, int64_t *got) {
+    *got = 0;
     int32_t empty_reads = 0;
-    while (got < capacity) {
-        const auto want = static_cast<int32_t>(std::min(capacity - got, kReadBytes));
-        mtsrc_frame frame = {dst + got, 0};
+    while (*got < capacity) {
+        const auto want = static_cast<int32_t>(std::min(capacity - *got, kReadBytes));
+        mtsrc_frame frame = {dst + *got, 0};
         const int32_t result = mtsrc_getstream(src, want, &frame);
         const int32_t delivered = std::clamp(frame.size, 0, want);
         empty_reads = delivered > 0 ? 0 : empty_reads + 1;
         if (is_failure(result) || empty_reads == kMaxEmptyReads) {
-            store_flag(&read_failed, 1);
+            mark_read_failed();
             break;
         }
-        got += delivered;
+        *got += delivered;
         if (result == kMtsrcEndOfStream) break;
     }
-    return got;
-}
-
-void clear_read_failure() {
-    store_flag(&read_failed, 0);
 }
 
 bool has_read_failed() {
     return load_flag(&read_failed) != 0;
+}
+
+void mark_read_failed() {
+    store_flag(&read_failed, 1);
+}
+
+void clear_read_failed() {
+    store_flag(&read_failed, 0);
 }

@@ -1,7 +1,7 @@
 // Reads a media source until a buffer is full.
 //
-// In: a positioned source. Out: 16-bit mono PCM, bytes. Called for a segment (pcm/decode_run.cpp)
-// and for the probe at a highlight (pcm/from_highlight.cpp).
+// In: a positioned source. Out: 16-bit mono PCM, bytes. Called for a segment (pcm/decode.cpp) and
+// for the probe at a highlight (pcm/from_highlight.cpp).
 #ifndef TAVO_PCM_READ_PCM_H
 #define TAVO_PCM_READ_PCM_H
 
@@ -10,12 +10,14 @@
 constexpr int64_t kReadBytes = 8192;  // largest single request to a source
 
 // Fills dst with up to capacity bytes from the source's position, until it is full, the stream
-// ends or the source fails; the bytes of a failed call are not counted. Returns the bytes.
-int64_t read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity);
+// ends or the source fails. *got: the bytes, from 0 on, growing with each read; those of a failed
+// read are not counted.
+void read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity, int64_t *got);
 
-// Whether a read has failed since the failure was last cleared, which tavo_decode_init does. The
-// record is process-wide, as the decoding is: one instance at a time.
+// Whether a read, or the memory for one, has failed since tavo_decode_init cleared the record. It
+// is process-wide, as the decoding is: one instance at a time.
 bool has_read_failed();
-void clear_read_failure();
+void mark_read_failed();
+void clear_read_failed();
 
 #endif

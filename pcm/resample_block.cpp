@@ -1,25 +1,32 @@
+#include "pcm/resample_block.h"
+
 #include <algorithm>
 #include <cstdlib>
-#include <cstring>
 
 #include "common/alloc.h"
+#include "common/lanes.h"
 #include "common/worker_group.h"
-#include "pcm/resample_engines.h"
+
+pthread_mutex_t *ext_mutex_resample = nullptr;
+pthread_cond_t *ext_cond_resample = nullptr;
 
 namespace {
 
 constexpr int32_t kParts = 4;
 constexpr int32_t kExactFloats = 1 << 24;  // whole numbers up to here are exact as floats
 
-using vec_f32 = float __attribute__((vector_size(16)));
-using vec_i32 = int32_t __attribute__((vector_size(16)));
+// Number of outputs, from 0 on, whose block has exactly whole samples. After them, positions in
+// single precision are rounded.
+int64_t exact_blocks(int32_t whole) {
+    return whole == 3 ? kExactFloats / 3 : kExactFloats;
+}
 
 // First input sample of output i, at most count. Single precision on purpose: the blocks of long
 // signals follow its rounding.
 int64_t block_start(float ratio, int64_t i, int64_t count) {
-    const float place = ratio * static_cast<float>(i);
-    const bool inside = static_cast<double>(place) < static_cast<double>(count);
-    return inside ? static_cast<int64_t>(place) : count;
+    const float position = ratio * static_cast<float>(i);
+    const bool inside = static_cast<double>(position) < static_cast<double>(count);
+    return inside ? static_cast<int64_t>(position) : count;
 }
 
 double block_mean(const int16_t *in, int64_t first, int64_t end) {
@@ -33,18 +40,18 @@ double block_mean(const int16_t *in, int64_t first, int64_t end) {
 void average_blocks(float ratio, const int16_t *in, int64_t base, int64_t count, double *out,
                     int64_t first, int64_t end) {
     for (int64_t i = first; i < end; ++i) {
-        const int64_t from = block_start(ratio, i, count);
-        const int64_t to = block_start(ratio, i + 1, count);
-        if (from < to) {
-            out[i] = block_mean(in, from - base, to - base);
-        } else {  // rounding left the block empty: take the sample there, or the last one
-            out[i] = in[std::min(from, count - 1) - base];
+        const int64_t begin = block_start(ratio, i, count);
+        const int64_t next = block_start(ratio, i + 1, count);
+        if (begin < next) {
+            out[i] = block_mean(in, begin - base, next - base);
+        } else {  // rounding left the block empty: the sample at its start, or the last one
+            out[i] = in[std::min(begin, count - 1) - base];
         }
     }
 }
 
 // Blocks of exactly kWhole samples. Sums of so few are exact in single precision, so integers give
-// the same. out may be the memory of in when kWhole is 4: a step is read before it is written.
+// the same. out may be the memory of in if kWhole is 4: a step is read before it is written.
 template <int32_t kWhole>
 void average_whole(const int16_t *in, double *out, int64_t first, int64_t end) {
     constexpr int32_t kStep = 64;  // outputs
@@ -65,15 +72,15 @@ void average_whole(const int16_t *in, double *out, int64_t first, int64_t end) {
 // Blocks of four, four outputs side by side.
 void average_fours(const int16_t *in, double *out, int64_t first, int64_t end) {
     for (; first + 4 <= end; first += 4) {
-        vec_i32 a;  // two samples in each lane
-        vec_i32 b;
+        int_quad a;  // two samples in each lane
+        int_quad b;
         memcpy(&a, in + first * 4, sizeof a);
         memcpy(&b, in + first * 4 + 8, sizeof b);
-        const vec_i32 pairs_a = ((a << 16) >> 16) + (a >> 16);
-        const vec_i32 pairs_b = ((b << 16) >> 16) + (b >> 16);
-        const vec_i32 sums = __builtin_shufflevector(pairs_a, pairs_b, 0, 2, 4, 6) +
-                             __builtin_shufflevector(pairs_a, pairs_b, 1, 3, 5, 7);
-        const vec_f32 means = __builtin_convertvector(sums, vec_f32) / 4.0f;
+        const int_quad pairs_a = ((a << 16) >> 16) + (a >> 16);
+        const int_quad pairs_b = ((b << 16) >> 16) + (b >> 16);
+        const int_quad sums = __builtin_shufflevector(pairs_a, pairs_b, 0, 2, 4, 6) +
+                              __builtin_shufflevector(pairs_a, pairs_b, 1, 3, 5, 7);
+        const float_quad means = __builtin_convertvector(sums, float_quad) / 4.0f;
         const double wide[4] = {means[0], means[1], means[2], means[3]};
         memcpy(out + first, wide, sizeof wide);
     }
@@ -96,6 +103,21 @@ void average_part(void *record) {
     average_blocks(part->ratio, part->in, 0, part->in_count, part->out, exact, part->end);
 }
 
+// The outputs at ratio 4 from exact_blocks(4) to n, in the memory of in: blocks that begin before
+// their output are read ahead of it.
+void average_rounded_in_place(const int16_t *in, int64_t count, double *out, int64_t n) {
+    // Outputs. The position of every kStep-th is exact in songs of up to 72 days, so that no block
+    // of a step extends further than one sample into the next.
+    constexpr int64_t kStep = 4096;
+    int16_t window[4 * kStep + 1];
+    for (int64_t first = exact_blocks(4); first < n; first += kStep) {
+        const int64_t begin = 4 * first;
+        const int64_t end = std::min(begin + 4 * kStep + 1, count);
+        memcpy(window, in + begin, static_cast<size_t>(end - begin) * sizeof *in);
+        average_blocks(4.0f, window, begin, count, out, first, std::min(first + kStep, n));
+    }
+}
+
 }  // namespace
 
 int32_t whole_ratio(float ratio) {
@@ -103,10 +125,6 @@ int32_t whole_ratio(float ratio) {
         if (ratio == static_cast<float>(whole)) return whole;
     }
     return 0;
-}
-
-int64_t exact_blocks(int32_t whole) {
-    return whole == 3 ? kExactFloats / 3 : kExactFloats;
 }
 
 void resampleMT_thd_cleanup(void *part) {
@@ -123,16 +141,18 @@ bool average_on_threads(const int16_t *in, int64_t count, float ratio, double *o
     auto *done = zeroed_items<int32_t>(kParts);
     const bool ready = parts != nullptr && done != nullptr;
     if (ready) {
+        const bool in_place = static_cast<const void *>(in) == out;
+        const int64_t on_threads = in_place ? std::min(n, exact_blocks(kMaxWholeRatio)) : n;
+        const int64_t length = on_threads / kParts;
         worker_slot slots[kParts] = {};
-        const int64_t share = n / kParts;
         for (int32_t i = 0; i < kParts; ++i) {
             RESAMPLE_PART *part = &parts[i];
             part->index = i;
             part->in = in;
             part->out = out;
             part->ratio = ratio;
-            part->first = i * share;
-            part->end = i == kParts - 1 ? n : (i + 1) * share;
+            part->first = i * length;
+            part->end = i == kParts - 1 ? on_threads : (i + 1) * length;
             part->in_count = count;
             part->out_count = n;
             part->done = done;
@@ -142,23 +162,11 @@ bool average_on_threads(const int16_t *in, int64_t count, float ratio, double *o
             slots[i] = {part, &part->thread, _resampleMT, average_part};
         }
         worker_group_run(slots, kParts, ext_mutex_resample, ext_cond_resample, done);
+        if (on_threads < n) average_rounded_in_place(in, count, out, n);
     }
     free(done);
     free(parts);
     return ready;
-}
-
-void average_behind_exact(const int16_t *in, int64_t count, double *out, int64_t n) {
-    // Outputs. The place of every kStep-th is exact in the songs of up to 72 days, so that no block
-    // of a step reaches further than one sample into the next.
-    constexpr int64_t kStep = 4096;
-    int16_t window[4 * kStep + 1];
-    for (int64_t first = exact_blocks(4); first < n; first += kStep) {
-        const int64_t begin = 4 * first;
-        const int64_t end = std::min(begin + 4 * kStep + 1, count);
-        memcpy(window, in + begin, static_cast<size_t>(end - begin) * sizeof *in);
-        average_blocks(4.0f, window, begin, count, out, first, std::min(first + kStep, n));
-    }
 }
 
 void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, double *out,

@@ -7,18 +7,37 @@
 
 namespace {
 
-// Where data goes in the output of total bytes: the last place that holds its first bytes, never
+// Copied before their pages are released. Chunks end where huge pages do.
+constexpr int64_t kChunkBytes = 2 << 20;
+
+// Offset of data in the output of total bytes: the last place that holds its first bytes, never
 // byte 0; else the end.
-int64_t find_seam(const uint8_t *dst, int64_t total, const uint8_t *data, int64_t avail) {
+int64_t find_splice(const uint8_t *dst, int64_t total, const uint8_t *data, int64_t avail) {
     if (avail < kBlockBytes) return total;
-    const int64_t seam = find_highest(dst, {1, total - kBlockBytes + 1}, data);
-    return seam == kNoPlace ? total : seam;
+    const int64_t splice = find_highest(dst, {1, total - kBlockBytes + 1}, data);
+    return splice == kNotFound ? total : splice;
+}
+
+// Copies bytes from data, which is in the segment's buffer, and releases what was copied as it
+// goes: no more than a chunk is held twice.
+void move_pages(const TAVO_DECSEG *seg, uint8_t *dst, const uint8_t *data, int64_t bytes) {
+    const uint8_t *done = seg->buf;  // released up to here
+    int64_t at = 0;
+    while (at < bytes) {
+        const auto in_chunk =
+            static_cast<int64_t>(reinterpret_cast<uintptr_t>(data + at) % kChunkBytes);
+        const int64_t chunk = std::min(bytes - at, kChunkBytes - in_chunk);
+        memcpy(dst + at, data + at, static_cast<size_t>(chunk));
+        at += chunk;
+        done = release_pages(done, data + at);
+    }
+    release_pages(done, seg->buf + seg->got);
 }
 
 }  // namespace
 
 int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
-                        int64_t capacity) {
+                        int64_t capacity, segment_pages pages) {
     const int64_t skip = second_bytes(rate);
     if (dst == nullptr || capacity < 1 || skip < 1) return 0;
 
@@ -30,10 +49,14 @@ int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uin
         if (avail < 1) return 0;
 
         const uint8_t *data = seg[k].buf + drop;
-        if (k > 0) total = find_seam(dst, total, data, avail);
+        if (k > 0) total = find_splice(dst, total, data, avail);
         const int64_t bytes = std::min(capacity - total, avail);
         if (bytes < 1) return 0;
-        memmove(dst + total, data, static_cast<size_t>(bytes));
+        if (pages == segment_pages::released && seg[k].cap >= kLargeBytes) {
+            move_pages(&seg[k], dst + total, data, bytes);
+        } else {
+            memcpy(dst + total, data, static_cast<size_t>(bytes));
+        }
         total += bytes;
     }
     return total;

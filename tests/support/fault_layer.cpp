@@ -53,6 +53,8 @@ int64_t refused() {
 WRAP(kMalloc, void *, malloc, (size_t size), (size), nullptr)
 WRAP(kCalloc, void *, calloc, (size_t items, size_t size), (items, size), nullptr)
 WRAP(kRealloc, void *, realloc, (void *block, size_t size), (block, size), nullptr)
+WRAP(kMalloc, int, posix_memalign, (void **block, size_t alignment, size_t size),
+     (block, alignment, size), ENOMEM)
 WRAP(kThread, int, pthread_create,
      (pthread_t * id, const pthread_attr_t *how, void *(*run)(void *), void *with),
      ((report_thread(run, with), id), how, run, with), EAGAIN)

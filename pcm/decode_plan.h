@@ -1,0 +1,64 @@
+// Stage 2a: plans the decoding.
+//
+// In: a path, or a start in the stream. Out: the segments, each with an open source and a buffer,
+// and a cleared buffer for the whole. Before: media_source/mtsrc.h. After: pcm/decode.h.
+//
+// The stream is cut into 1 or 4 segments, each with a media source, a buffer and a thread of its
+// own. All but the last decode two seconds more than their length.
+#ifndef TAVO_PCM_DECODE_PLAN_H
+#define TAVO_PCM_DECODE_PLAN_H
+
+#include "common/tavo_ctx.h"
+#include "media_source/mtsrc.h"
+
+// One decoding segment. A thread touches only its own record, buffer and source; done is shared and
+// guarded by the mutex.
+struct TAVO_DECSEG {
+    int32_t index;  // from 0, also its slot in done
+    pthread_t thread;
+    mtsrc_ctx *src;          // opened at setup, kept to the end, owned
+    mtsrc_param open_param;  // path: read only while setup runs
+    TAVO_FMT fmt;
+    int64_t duration;        // of the stream, 100-ns units
+    uint8_t *buf;            // [cap] PCM bytes, owned
+    int64_t cap;             // bytes
+    int64_t got;             // bytes decoded into buf
+    int64_t start;           // 100-ns units from the start of the stream
+    int64_t seek_pos;        // position that the seek reported, 100-ns units
+    int32_t *done;           // [seg_count] one array for all segments, owned by the table
+    int32_t count;           // segments of the plan
+    pthread_mutex_t *mutex;  // ext_mutex_mt
+    pthread_cond_t *cond;    // ext_cond_mt
+};
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_DECSEG, src) == 16 && offsetof(TAVO_DECSEG, duration) == 48));
+static_assert(sizeof(void *) != 8 ||
+              (offsetof(TAVO_DECSEG, got) == 72 && offsetof(TAVO_DECSEG, cond) == 120));
+
+extern "C" {
+
+// The decoding group's lock and condition, from tavo_decode_init to tavo_decode_deinit; else null.
+extern pthread_mutex_t *ext_mutex_mt;
+extern pthread_cond_t *ext_cond_mt;
+
+// Plans the decoding of the file: fills fmt, duration, seg, seg_count, pcm, pcm_bytes.
+// Returns 0; TAVO_ERR_MEMORY; TAVO_ERR_FORMAT unusable, at most 1 s long or below 8000 Hz;
+// TAVO_ERR_HANDLE the file cannot be opened; or the code of a segment's source. On failure all
+// made here is released.
+int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param);
+
+// Releases the segment table with sources and buffers, the PCM buffer, the lock and the condition.
+// Safe on a partly built setup and when called twice.
+void tavo_decode_deinit(TAVO_CTX *ctx);
+
+// Plans again for the stream from start (100-ns units) to its end, with the sources that are open,
+// and allocates new segment buffers and a new pcm. The caller has freed the old ones. Returns 0;
+// TAVO_ERR_MEMORY out of memory or nothing left, with the segment buffers freed.
+int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
+}
+
+// Whether a stream can be analysed: TAVO_OK, TAVO_ERR_SHORT, TAVO_ERR_LOW_RATE, or TAVO_ERR_FORMAT
+// if its byte count overflows.
+int32_t check_stream(const mtsrc_format &format);
+
+#endif

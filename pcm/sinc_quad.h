@@ -1,0 +1,16 @@
+// Four output frames of the windowed-sinc interpolator side by side, bit-identical to one by one.
+//
+// In: 16-bit mono PCM. Out: 16-bit mono PCM. Called by pcm/resample_sinc.cpp.
+#ifndef TAVO_PCM_SINC_QUAD_H
+#define TAVO_PCM_SINC_QUAD_H
+
+#include "pcm/resample_sinc.h"
+
+constexpr int32_t kQuad = 4;
+
+// Computes frames j to j + 3 into out[4]. Returns false, with nothing written, if the input of one
+// of them is not wholly inside in[in_len] or its phase may be out of range.
+bool filter_quad(const dorn_resampler_state &state, int64_t j, const int16_t *in, int32_t in_len,
+                 int16_t *out);
+
+#endif
