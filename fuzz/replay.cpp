@@ -2,6 +2,8 @@
 // the same ones each time. That of a failure is left beside the program, in a file named .last.
 #include <fcntl.h>
 
+#include <ctime>
+
 #include "fuzz/fuzz.h"
 #include "tests/support/bytes.h"
 
@@ -31,7 +33,9 @@ bytes next_input(const std::vector<bytes> &kept) {
 
 void run(int last, const bytes &input) {
     fuzz::fill(last, input);
+    const clock_t start = clock();
     LLVMFuzzerTestOneInput(input.data(), input.size());
+    fuzz::must(clock() - start <= RUN_SECONDS * CLOCKS_PER_SEC, "a run takes no longer than it may");
 }
 
 }  // namespace

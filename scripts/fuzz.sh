@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # scripts/fuzz.sh [--keep] SECONDS [TARGET]...
-# Fuzzes each target (all five by default) for SECONDS, from its kept inputs (fuzz/corpus/TARGET) and,
-# where files are its inputs, the tests' short songs. Fails when one finds something; the input is kept
-# in build/fuzz/findings. --keep then takes the smallest set of inputs that reaches as much, those below
-# 6 KiB, into fuzz/corpus.
+# Fuzzes each target (all five by default) for SECONDS, from its kept inputs (fuzz/corpus/TARGET.tar.gz
+# and fuzz/corpus/TARGET) and, where files are its inputs, the tests' short songs. A run of more than 2 s
+# fails. The input of a failure is kept in build/fuzz/findings. --keep then replaces the archive by the
+# smallest set of inputs that covers as much, those below 6 KiB.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 keep=
@@ -25,8 +25,13 @@ mkdir -p build/fuzz/findings
 export ASAN_OPTIONS=allocator_may_return_null=1:max_allocation_size_mb=1024:quarantine_size_mb=8
 
 fuzz() { # fuzz TARGET
-  local program=(build/fuzz/bin/fuzz_"$1" -timeout=20 -rss_limit_mb=2048 -malloc_limit_mb=1024)
-  local inputs=(build/fuzz/work/"$1" fuzz/corpus/"$1")
+  local program=(build/fuzz/bin/fuzz_"$1" -timeout=2 -rss_limit_mb=2048 -malloc_limit_mb=1024)
+  local found=build/fuzz/found/"$1"
+  rm -rf "$found"
+  mkdir -p "$found"
+  tar -xzf fuzz/corpus/"$1".tar.gz -C "$found"
+  local inputs=(build/fuzz/work/"$1" "$found")
+  [[ ! -d fuzz/corpus/$1 ]] || inputs+=(fuzz/corpus/"$1")
   case $1 in source | recognition | job) inputs+=(tests/results/songs) ;; esac
   mkdir -p "${inputs[0]}"
   "${program[@]}" -max_total_time="$seconds" -max_len=8192 -artifact_prefix=build/fuzz/findings/"$1"- \
@@ -36,9 +41,8 @@ fuzz() { # fuzz TARGET
   rm -rf build/fuzz/smaller/"$1"
   mkdir -p build/fuzz/smaller/"$1"
   "${program[@]}" -merge=1 build/fuzz/smaller/"$1" "${inputs[@]}" 2>/dev/null
-  find fuzz/corpus/"$1" -type f ! -name 'crash-*' -delete
-  find build/fuzz/smaller/"$1" -type f -size -6k -printf '%s %p\n' | sort -n | head -n 60 | cut -d' ' -f2- |
-    xargs -r cp -t fuzz/corpus/"$1"
+  find build/fuzz/smaller/"$1" -type f -size -6k -printf '%s %f\n' | sort -n | head -n 60 | cut -d' ' -f2- |
+    tar -czf fuzz/corpus/"$1".tar.gz -C build/fuzz/smaller/"$1" --mtime=@0 --owner=0 --group=0 --numeric-owner -T -
 }
 export -f fuzz
 export seconds keep
