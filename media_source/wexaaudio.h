@@ -3,8 +3,12 @@
 // read by another binary, so each offset is asserted.
 //
 // Every reader opens the file itself through the callbacks of mtsrc_io. Results: 0 success,
-// kWexaEndOfStream, anything else failure. Times are in 100-ns units unless said otherwise. Objects
-// of different sources are used on different threads at once and share nothing.
+// kWexaEndOfStream, anything else failure. Times are in 100-ns units unless noted otherwise.
+// Objects of different sources are used on different threads at once.
+//
+// A "frame" is whatever a library's own reader passes to its own decoder: compressed bytes, or PCM
+// that the reader has decoded already, which the decoder then copies. A source only carries it from
+// one to the other and depends on nothing but its byte count.
 #ifndef TAVO_MEDIA_SOURCE_WEXAAUDIO_H
 #define TAVO_MEDIA_SOURCE_WEXAAUDIO_H
 
@@ -101,7 +105,7 @@ static_assert(sizeof(void *) != 8 ||
 static_assert(sizeof(void *) != 8 ||
               (offsetof(xmp123_info, duration) == 40 && sizeof(xmp123_info) == 56));
 
-constexpr int32_t kMp4Tracks = 64;  // room for kinds
+constexpr int32_t kMp4Tracks = 64;  // entries of kind
 struct xmp4_info {
     int32_t track_count;
     int32_t reserved_4[3];
@@ -130,7 +134,7 @@ static_assert(sizeof(void *) != 8 ||
 static_assert(sizeof(void *) != 8 ||
               (offsetof(xmp4_track, channels) == 20 && sizeof(xmp4_track) == 72));
 
-constexpr int32_t kOggStreams = 16;  // room for kinds
+constexpr int32_t kOggStreams = 16;  // entries of kind
 struct xogg_info {
     int32_t kind[kOggStreams];
     int32_t stream_count;
@@ -171,7 +175,7 @@ struct xaac_config {
 };
 static_assert(sizeof(void *) != 8 || (sizeof(wexa_config) == 16 && sizeof(xaac_config) == 32));
 
-// One compressed frame, handed to a decoder.
+// One frame, compressed or PCM, passed from a reader to the decoder.
 struct wexa_frame {
     void *data;
     uint64_t reserved_8;
@@ -222,7 +226,7 @@ int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int
 int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32_t flags);
 void xwavd_delete(void *reader);
 
-// AAC in ADTS or ADIF form. create: reserved is null.
+// AAC in ADTS or ADIF form; a library may support one of them. create: reserved is null.
 int32_t xaac_init(void);
 void xaac_deinit(void);
 void *xaacfd_create(const mtsrc_io *io, int64_t *word, xaac_info *info, void *reserved);

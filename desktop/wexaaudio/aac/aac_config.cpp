@@ -8,6 +8,7 @@ constexpr int32_t kRates[] = {96000, 88200, 64000, 48000, 44100, 32000, 24000,
                               22050, 16000, 12000, 11025, 8000,  7350};
 constexpr int32_t kRateCount = sizeof kRates / sizeof kRates[0];
 constexpr int32_t kMixdownBits[] = {4, 4, 3};  // mono, stereo, matrix
+constexpr int32_t kIdentifierBits = 3;         // of an element in a raw block
 constexpr int32_t kRateEscape = 15;            // 24 bits of Hz follow
 constexpr int32_t kObjectEscape = 31;          // 6 more bits follow
 
@@ -77,12 +78,12 @@ void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index
     config->size = static_cast<int32_t>((w.at + 7) / 8);
 }
 
-int64_t aac_config_from_program(aac_config *config, const uint8_t *data, int32_t bytes,
-                                int64_t start, int32_t object_type, int32_t rate_index) {
+bool aac_config_from_program(aac_config *config, const uint8_t *data, int32_t bytes,
+                             int32_t object_type, int32_t rate_index) {
     *config = {};
     config->object_type = object_type;
     config->rate_index = rate_index;
-    bit_reader r = {data, static_cast<int64_t>(bytes) * 8, start, false};
+    bit_reader r = {data, static_cast<int64_t>(bytes) * 8, kIdentifierBits, false};
     bit_writer w = {config->bytes, 0};
     put_core(&w, *config);
     put_general(&w, *config);
@@ -104,7 +105,7 @@ int64_t aac_config_from_program(aac_config *config, const uint8_t *data, int32_t
     w.at = (w.at + 7) / 8 * 8;
     put(&w, 0, 8);
     config->size = static_cast<int32_t>(w.at / 8);
-    return r.failed || r.at > r.bits ? -1 : r.at;
+    return !r.failed && r.at <= r.bits;
 }
 
 bool aac_config_read(aac_config *config, const void *data, int32_t bytes) {

@@ -1,6 +1,6 @@
 // The AudioSpecificConfig of an AAC stream: what a decoder must be told before raw blocks.
 //
-// In: fields of an ADTS or ADIF header, or the configuration that an MP4 track carries. Out: bytes
+// In: fields of an ADTS header, or the configuration that an MP4 track carries. Out: bytes
 // for the decoder's set-up data.
 #ifndef WEXAAUDIO_AAC_CONFIG_H
 #define WEXAAUDIO_AAC_CONFIG_H
@@ -28,11 +28,10 @@ int32_t aac_rate_of_index(int32_t index);
 // For a stream whose headers state all that there is. channels 1 to 15.
 void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index, int32_t channels);
 
-// For a stream whose channels a program configuration element gives; the element starts at bit
-// start of data, after its identifier. Returns the bit behind it, -1 when it does not lie within
-// bytes.
-int64_t aac_config_from_program(aac_config *config, const uint8_t *data, int32_t bytes,
-                                int64_t start, int32_t object_type, int32_t rate_index);
+// For a stream whose channels are stated by the program configuration element at the start of data,
+// a raw block. False when the element does not end within bytes.
+bool aac_config_from_program(aac_config *config, const uint8_t *data, int32_t bytes,
+                             int32_t object_type, int32_t rate_index);
 
 // Takes over a configuration and reads its first fields. False when it is too long or too short.
 bool aac_config_read(aac_config *config, const void *data, int32_t bytes);

@@ -29,8 +29,8 @@ struct learned {
 };
 
 // Decodes a frame alone with a fresh decoder.
-learned decode_alone(io_file *file, const codec_library *library, const aac_config *config,
-                     const frame_entry &entry) {
+learned decode_alone(io_file *file, const aac_config *config, const frame_entry &entry) {
+    const codec_library *library = codec_library_get();
     learned got = {};
     av_decoder *d = library->open("aac", config->bytes, config->size);
     uint8_t *packet = d != nullptr && entry.bytes > 0 && entry.bytes <= kMaxBlockBytes
@@ -45,14 +45,13 @@ learned decode_alone(io_file *file, const codec_library *library, const aac_conf
 }
 
 // The output of the first frames; of those that decode, the one with the highest rate.
-learned learn_output(io_file *file, const codec_library *library, const aac_config *config,
-                     const frame_index *frames) {
+learned learn_output(io_file *file, const aac_config *config, const frame_index *frames) {
     learned best = {};
     const int32_t core_rate = aac_rate_of_index(config->rate_index);
     const bool may_have_sbr =
         config->object_type == kAacLowComplexity && core_rate > 0 && core_rate <= kMaxSbrCore;
     for (int64_t k = 0; k < std::min<int64_t>(frames->count, kLearnFrames); ++k) {
-        const learned got = decode_alone(file, library, config, frames->entry[k]);
+        const learned got = decode_alone(file, config, frames->entry[k]);
         if (got.samples > 0 && got.samples <= kMaxFrameSamples && got.rate > best.rate) best = got;
         const bool sure = !may_have_sbr || best.rate > core_rate || k + 1 >= kSbrFrames;
         if (best.rate > 0 && sure) break;
@@ -62,9 +61,8 @@ learned learn_output(io_file *file, const codec_library *library, const aac_conf
 
 }  // namespace
 
-bool aac_stream_learn(io_file *file, const codec_library *library, aac_config *config,
-                      stream_info *info) {
-    const learned output = learn_output(file, library, config, &info->frames);
+bool aac_stream_learn(io_file *file, aac_config *config, stream_info *info) {
+    const learned output = learn_output(file, config, &info->frames);
     if (output.rate <= 0) return false;
     const bool sbr = output.rate == 2 * aac_rate_of_index(config->rate_index);
     if (sbr) aac_config_make_sbr(config, config->channels == 1 && output.channels == 2);

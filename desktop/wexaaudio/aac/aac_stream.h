@@ -1,4 +1,4 @@
-// The raw blocks of one AAC track, shared by the ADTS/ADIF reader and the MP4 demuxer.
+// The raw blocks of one AAC track, shared by the ADTS reader and the MP4 demuxer.
 //
 // In: where each raw block lies in the file, the configuration. Out: a stream whose blocks all have
 // one length.
@@ -16,7 +16,6 @@
 // wrongly), makes the configuration explicit, gives all frames their length and chooses the groups.
 // A block longer than any can be becomes silence. False when nothing there decodes or out of
 // memory.
-bool aac_stream_learn(io_file *file, const codec_library *library, aac_config *config,
-                      stream_info *info);
+bool aac_stream_learn(io_file *file, aac_config *config, stream_info *info);
 
 #endif

@@ -76,9 +76,18 @@ av_decoder *open_decoder(const char *name, const uint8_t *setup, int32_t setup_b
     return nullptr;
 }
 
+// The packet keeps its buffer from frame to frame, unless libavcodec still refers to it.
 uint8_t *make_packet(av_decoder *d, int32_t bytes) {
-    av_packet_unref(d->packet);
-    return av_new_packet(d->packet, bytes) == 0 ? d->packet->data : nullptr;
+    AVPacket *packet = d->packet;
+    const size_t needed = static_cast<size_t>(bytes) + AV_INPUT_BUFFER_PADDING_SIZE;
+    if (packet->buf == nullptr || packet->buf->size < needed ||
+        av_buffer_is_writable(packet->buf) == 0) {
+        av_packet_unref(packet);
+        return av_new_packet(packet, bytes) == 0 ? packet->data : nullptr;
+    }
+    packet->size = bytes;
+    memset(packet->data + bytes, 0, AV_INPUT_BUFFER_PADDING_SIZE);
+    return packet->data;
 }
 
 // The one sample format of the decoders used here is planar float.
@@ -90,7 +99,6 @@ bool is_audio(const AVFrame *frame) {
 int32_t decode(av_decoder *d) {
     av_frame_unref(d->frame);
     int result = avcodec_send_packet(d->ctx, d->packet);
-    av_packet_unref(d->packet);
     if (result == 0) result = avcodec_receive_frame(d->ctx, d->frame);
     if (result == AVERROR(EAGAIN)) return 0;
     // A damaged packet may hold more than its frame: what is left must not come out with the next.
@@ -122,25 +130,6 @@ int32_t write_pcm(const av_decoder *d, int32_t channels, int32_t skip, int32_t c
     return n;
 }
 
-// libavcodec states, with each frame, how much of its packet was left when the frame was begun.
-int32_t split(av_decoder *d, int32_t stop, int32_t *begin, int32_t room) {
-    const int32_t bytes = d->packet->size;
-    int32_t count = 0;
-    int32_t last = -1;
-    bool more = avcodec_send_packet(d->ctx, d->packet) == 0;
-    av_packet_unref(d->packet);
-    while (more && count < room && avcodec_receive_frame(d->ctx, d->frame) == 0) {
-        const int32_t at = bytes - d->frame->pkt_size;
-        if (at <= last || at >= bytes) break;
-        last = at;
-        begin[count++] = at;
-        more = at <= stop;
-    }
-    avcodec_flush_buffers(d->ctx);
-    av_frame_unref(d->frame);
-    return count;
-}
-
 vorbis_parser *open_parser(const uint8_t *setup, int32_t setup_bytes) {
     pthread_once(&prepare_once, prepare);
     return reinterpret_cast<vorbis_parser *>(av_vorbis_parse_init(setup, setup_bytes));
@@ -158,6 +147,6 @@ int32_t parse_samples(vorbis_parser *parser, uint8_t first) {
 }  // namespace
 
 const codec_library wexaaudio_av = {
-    open_decoder, close_decoder, make_packet, decode,       get_format,
-    write_pcm,    split,         open_parser, close_parser, parse_samples,
+    open_decoder, close_decoder, make_packet,  decode,        get_format,
+    write_pcm,    open_parser,   close_parser, parse_samples,
 };

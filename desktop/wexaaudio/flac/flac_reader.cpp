@@ -10,7 +10,7 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "desktop/wexaaudio/shared/io_file.h"
+#include "desktop/wexaaudio/shared/scan_cache.h"
 #include "desktop/wexaaudio/shared/units.h"
 #include "media_source/wexaaudio.h"
 
@@ -19,240 +19,284 @@ namespace {
 constexpr int32_t kPair = 2 * sizeof(int16_t);  // bytes
 constexpr int64_t kTail = 65'536;               // bytes of the file's end looked at first
 
+// Sample frames that a byte of the file is believed to stand for. Digital silence has 290 in the
+// encoder's default blocks of 4096, and 1200 in the largest blocks of a streamable file.
+constexpr int64_t kMaxSamplesPerByte = 2048;
+
+// One pass through the blocks of a file.
+struct flac_stream {
+    io_file *file;
+    FLAC__StreamDecoder *decoder;  // owned
+    int64_t at;                    // offset that the decoder reads next
+    int32_t max_block;             // sample frames
+    int64_t stated;                // sample frames by the stream information, 0 unknown
+    int64_t base;                  // number of the stream's first sample
+    int16_t *pcm;                  // [max_block][2] owned; the block decoded last
+    int64_t block;                 // its first sample
+    int32_t count;                 // its sample frames; 0 without one
+    int32_t rate;                  // its rate, Hz
+    bool damaged;                  // the frame being decoded has a wrong check sum
+};
+
+// What a scan finds.
+struct flac_extent {
+    int32_t rate;  // Hz
+    int64_t base;  // number of the stream's first sample
+    int64_t end;   // sample frames
+};
+
 struct flac_reader {
     uint8_t reserved[kFlacReaderFlag];
     uint8_t flag;  // set by the source before every read; nothing depends on it
     io_file file;
-    FLAC__StreamDecoder *decoder;  // owned
-    int64_t at;                    // offset that the decoder reads next
-    int32_t rate;                  // Hz
-    int32_t max_block;             // sample frames
-    int64_t stated;                // sample frames by the stream information, 0 unknown
-    int64_t base;                  // number of the stream's first sample
-    int64_t end;                   // sample frames
-    int64_t next;                  // sample handed out next
-    int16_t *pcm;                  // [max_block][2] owned; the block decoded last
-    int64_t block;                 // its first sample
-    int32_t count;                 // its sample frames; 0 without one
-    bool damaged;                  // the frame being decoded has a wrong check sum
-    bool moved;                    // a seek came, and the decoder is elsewhere
+    flac_stream stream;
+    const flac_extent *extent;  // shared by the readers of the file
+    int64_t next;               // sample delivered next
+    bool moved;                 // a seek came, and the decoder is elsewhere
 };
 static_assert(offsetof(flac_reader, flag) == kFlacReaderFlag);
 
-flac_reader *reader_of(void *client) {
-    return static_cast<flac_reader *>(client);
+flac_stream *stream_of(void *client) {
+    return static_cast<flac_stream *>(client);
 }
 
 FLAC__StreamDecoderReadStatus read_bytes(const FLAC__StreamDecoder * /*decoder*/, FLAC__byte buf[],
                                          size_t *bytes, void *client) {
-    flac_reader *r = reader_of(client);
-    const int64_t got = io_file_read(&r->file, r->at, buf, static_cast<int64_t>(*bytes));
+    flac_stream *s = stream_of(client);
+    const int64_t got = io_file_read(s->file, s->at, buf, static_cast<int64_t>(*bytes));
     *bytes = static_cast<size_t>(std::max<int64_t>(got, 0));
     if (got < 0) return FLAC__STREAM_DECODER_READ_STATUS_ABORT;
-    r->at += got;
+    s->at += got;
     return got == 0 ? FLAC__STREAM_DECODER_READ_STATUS_END_OF_STREAM
                     : FLAC__STREAM_DECODER_READ_STATUS_CONTINUE;
 }
 
 FLAC__StreamDecoderSeekStatus move_to(const FLAC__StreamDecoder * /*decoder*/, FLAC__uint64 offset,
                                       void *client) {
-    reader_of(client)->at = static_cast<int64_t>(offset);
+    stream_of(client)->at = static_cast<int64_t>(offset);
     return FLAC__STREAM_DECODER_SEEK_STATUS_OK;
 }
 
 FLAC__StreamDecoderTellStatus tell(const FLAC__StreamDecoder * /*decoder*/, FLAC__uint64 *offset,
                                    void *client) {
-    *offset = static_cast<FLAC__uint64>(reader_of(client)->at);
+    *offset = static_cast<FLAC__uint64>(stream_of(client)->at);
     return FLAC__STREAM_DECODER_TELL_STATUS_OK;
 }
 
 FLAC__StreamDecoderLengthStatus get_length(const FLAC__StreamDecoder * /*decoder*/,
                                            FLAC__uint64 *length, void *client) {
-    *length = static_cast<FLAC__uint64>(reader_of(client)->file.size);
+    *length = static_cast<FLAC__uint64>(stream_of(client)->file->size);
     return FLAC__STREAM_DECODER_LENGTH_STATUS_OK;
 }
 
 FLAC__bool is_at_end(const FLAC__StreamDecoder * /*decoder*/, void *client) {
-    const flac_reader *r = reader_of(client);
-    return r->at >= r->file.size ? 1 : 0;
+    const flac_stream *s = stream_of(client);
+    return s->at >= s->file->size ? 1 : 0;
 }
 
-void take_info(const FLAC__StreamDecoder * /*decoder*/, const FLAC__StreamMetadata *metadata,
+void read_info(const FLAC__StreamDecoder * /*decoder*/, const FLAC__StreamMetadata *metadata,
                void *client) {
-    flac_reader *r = reader_of(client);
+    flac_stream *s = stream_of(client);
     const FLAC__StreamMetadata_StreamInfo &info = metadata->data.stream_info;
-    r->max_block = static_cast<int32_t>(info.max_blocksize);
-    r->stated = static_cast<int64_t>(info.total_samples);
+    s->max_block = static_cast<int32_t>(info.max_blocksize);
+    s->stated = static_cast<int64_t>(info.total_samples);
 }
 
-void take_error(const FLAC__StreamDecoder * /*decoder*/, FLAC__StreamDecoderErrorStatus status,
+void note_error(const FLAC__StreamDecoder * /*decoder*/, FLAC__StreamDecoderErrorStatus status,
                 void *client) {
     if (status == FLAC__STREAM_DECODER_ERROR_STATUS_FRAME_CRC_MISMATCH) {
-        reader_of(client)->damaged = true;
+        stream_of(client)->damaged = true;
     }
 }
 
-// One channel of a block as every second sample of pcm.
-void take_channel(const FLAC__int32 *in, int32_t bits, int32_t count, int16_t *pcm) {
-    if (bits <= 16) {
+// Stores a block as pairs of 16 bits.
+void store_pairs(const FLAC__int32 *left, const FLAC__int32 *right, int32_t bits, int32_t count,
+                 int16_t *pcm) {
+    const auto store = [&](auto convert) {
         for (ptrdiff_t i = 0; i < count; ++i) {
-            pcm[2 * i] = static_cast<int16_t>(in[i] * (1 << (16 - bits)));
+            pcm[2 * i] = static_cast<int16_t>(convert(left[i]));
+            pcm[2 * i + 1] = static_cast<int16_t>(convert(right[i]));
         }
-        return;
-    }
+    };
+    if (bits <= 16)
+        return store([&](FLAC__int32 x) { return static_cast<uint32_t>(x) << (16 - bits); });
     const int32_t half = 1 << (bits - 17);  // rounded to nearest, up at half; the top is clipped
-    for (ptrdiff_t i = 0; i < count; ++i) {
-        const int32_t high = (in[i] >> (bits - 16)) + ((in[i] & half) != 0 ? 1 : 0);
-        pcm[2 * i] = static_cast<int16_t>(std::min(high, 32767));
-    }
+    store([&](FLAC__int32 x) {
+        return std::min((x >> (bits - 16)) + ((x & half) != 0 ? 1 : 0), 32767);
+    });
 }
 
 // A frame with a wrong check sum is not taken: not even its number can be trusted.
-FLAC__StreamDecoderWriteStatus take_block(const FLAC__StreamDecoder * /*decoder*/,
-                                          const FLAC__Frame *frame,
-                                          const FLAC__int32 *const buffer[], void *client) {
-    flac_reader *r = reader_of(client);
+FLAC__StreamDecoderWriteStatus store_block(const FLAC__StreamDecoder * /*decoder*/,
+                                           const FLAC__Frame *frame,
+                                           const FLAC__int32 *const buffer[], void *client) {
+    flac_stream *s = stream_of(client);
     const FLAC__FrameHeader &head = frame->header;
     const auto count = static_cast<int32_t>(head.blocksize);
-    const bool usable = !r->damaged && count <= r->max_block;
-    r->damaged = false;
-    r->count = usable ? count : 0;
+    const bool usable = !s->damaged && count <= s->max_block;
+    s->damaged = false;
+    s->count = usable ? count : 0;
     if (!usable) return FLAC__STREAM_DECODER_WRITE_STATUS_CONTINUE;
-    r->block = static_cast<int64_t>(head.number.sample_number) - r->base;
-    if (r->rate == 0) r->rate = static_cast<int32_t>(head.sample_rate);
-    const auto bits = static_cast<int32_t>(head.bits_per_sample);
-    take_channel(buffer[0], bits, count, r->pcm);
-    take_channel(buffer[head.channels > 1 ? 1 : 0], bits, count, r->pcm + 1);
+    s->block = static_cast<int64_t>(head.number.sample_number) - s->base;
+    s->rate = static_cast<int32_t>(head.sample_rate);
+    store_pairs(buffer[0], buffer[head.channels > 1 ? 1 : 0],
+                static_cast<int32_t>(head.bits_per_sample), count, s->pcm);
     return FLAC__STREAM_DECODER_WRITE_STATUS_CONTINUE;
 }
 
-// The next block that can be used. False at the end of what is readable.
-bool decode_block(flac_reader *r) {
-    r->count = 0;
-    while (r->count == 0) {
-        if (FLAC__stream_decoder_process_single(r->decoder) == 0) return false;
-        const FLAC__StreamDecoderState state = FLAC__stream_decoder_get_state(r->decoder);
-        if (r->count == 0 && state >= FLAC__STREAM_DECODER_END_OF_STREAM) return false;
+bool open_stream(flac_stream *s, io_file *file) {
+    s->file = file;
+    s->decoder = FLAC__stream_decoder_new();
+    if (s->decoder == nullptr ||
+        FLAC__stream_decoder_init_stream(s->decoder, read_bytes, move_to, tell, get_length,
+                                         is_at_end, store_block, read_info, note_error,
+                                         s) != FLAC__STREAM_DECODER_INIT_STATUS_OK ||
+        FLAC__stream_decoder_process_until_end_of_metadata(s->decoder) == 0 || s->max_block <= 0) {
+        return false;
+    }
+    s->pcm = static_cast<int16_t *>(calloc(static_cast<size_t>(s->max_block), kPair));
+    return s->pcm != nullptr;
+}
+
+void close_stream(flac_stream *s) {
+    if (s->decoder != nullptr) FLAC__stream_decoder_delete(s->decoder);
+    free(s->pcm);
+}
+
+// Decodes the next block that can be used. False at the end of what is readable.
+bool decode_block(flac_stream *s) {
+    s->count = 0;
+    while (s->count == 0) {
+        if (FLAC__stream_decoder_process_single(s->decoder) == 0) return false;
+        const FLAC__StreamDecoderState state = FLAC__stream_decoder_get_state(s->decoder);
+        if (s->count == 0 && state >= FLAC__STREAM_DECODER_END_OF_STREAM) return false;
     }
     return true;
 }
 
-// Back to the first frame.
-bool rewind_stream(flac_reader *r) {
-    r->count = 0;
-    return FLAC__stream_decoder_reset(r->decoder) != 0 &&
-           FLAC__stream_decoder_process_until_end_of_metadata(r->decoder) != 0;
+// Returns to the first frame.
+bool rewind_stream(flac_stream *s) {
+    s->count = 0;
+    return FLAC__stream_decoder_reset(s->decoder) != 0 &&
+           FLAC__stream_decoder_process_until_end_of_metadata(s->decoder) != 0;
 }
 
 // Decodes the block that holds a sample; the block then starts there. False where none holds it.
-bool find_sample(flac_reader *r, int64_t sample) {
-    r->count = 0;
-    r->damaged = false;
-    const auto number = static_cast<FLAC__uint64>(r->base + sample);
-    return FLAC__stream_decoder_flush(r->decoder) != 0 &&  // out of a seek that failed
-           FLAC__stream_decoder_seek_absolute(r->decoder, number) != 0 && r->count > 0;
+bool find_sample(flac_stream *s, int64_t sample) {
+    s->count = 0;
+    s->damaged = false;
+    const auto number = static_cast<FLAC__uint64>(s->base + sample);
+    return FLAC__stream_decoder_flush(s->decoder) != 0 &&  // out of a seek that failed
+           FLAC__stream_decoder_seek_absolute(s->decoder, number) != 0 && s->count > 0;
 }
 
-// The end of the last block that begins at or behind an offset of the file; 0 without one.
-int64_t last_end(flac_reader *r, int64_t offset) {
-    r->damaged = false;
-    r->at = offset;
+// The end of the last block that begins at or after an offset of the file; 0 without one.
+int64_t last_end(flac_stream *s, int64_t offset) {
+    s->damaged = false;
+    s->at = offset;
     int64_t end = 0;
-    if (FLAC__stream_decoder_flush(r->decoder) == 0) return 0;
-    while (decode_block(r)) {
-        if (r->block >= 0 && r->block <= kMaxSamples - r->count) {
-            end = std::max(end, r->block + r->count);
+    if (FLAC__stream_decoder_flush(s->decoder) == 0) return 0;
+    while (decode_block(s)) {
+        if (s->block >= 0 && s->block <= kMaxSamples - s->count) {
+            end = std::max(end, s->block + s->count);
         }
     }
     return end;
 }
 
 // Where the audio that is there ends, which need not be where the stream information says: at the
-// end of the last block, looked for from the file's end.
-bool find_end(flac_reader *r) {
-    for (int64_t tail = kTail; r->end == 0 && !r->file.failed; tail *= 4) {
-        r->end = last_end(r, std::max<int64_t>(r->file.size - tail, 0));
-        if (tail >= r->file.size) break;
+// end of the last block, searched from the file's end. False where it has no end to be believed.
+bool find_end(flac_stream *s, int64_t *end) {
+    const int64_t size = s->file->size;
+    for (int64_t tail = kTail; *end == 0 && !s->file->failed; tail *= 4) {
+        *end = last_end(s, std::max<int64_t>(size - tail, 0));
+        if (tail >= size) break;
     }
-    if (r->stated > 0) r->end = std::min(r->end, r->stated);
-    return !r->file.failed && r->end > 0;
+    if (s->stated > 0) *end = std::min(*end, s->stated);
+    return !s->file->failed && *end > 0 && *end / kMaxSamplesPerByte <= size;
 }
 
-bool open_decoder(flac_reader *r) {
-    r->decoder = FLAC__stream_decoder_new();
-    if (r->decoder == nullptr ||
-        FLAC__stream_decoder_init_stream(r->decoder, read_bytes, move_to, tell, get_length,
-                                         is_at_end, take_block, take_info, take_error,
-                                         r) != FLAC__STREAM_DECODER_INIT_STATUS_OK ||
-        FLAC__stream_decoder_process_until_end_of_metadata(r->decoder) == 0 || r->max_block <= 0) {
-        return false;
-    }
-    r->pcm = static_cast<int16_t *>(calloc(static_cast<size_t>(r->max_block), kPair));
-    if (r->pcm == nullptr || !decode_block(r) || r->rate <= 0) return false;
-    r->base = r->block;
-    return find_end(r) && rewind_stream(r);
+bool scan_stream(flac_stream *s, io_file *file, flac_extent *extent) {
+    if (!open_stream(s, file) || !decode_block(s) || s->rate <= 0) return false;
+    extent->rate = s->rate;
+    extent->base = s->base = s->block;
+    return find_end(s, &extent->end);
 }
+
+bool scan_file(io_file *file, void *result) {
+    flac_stream stream = {};
+    const bool found = scan_stream(&stream, file, static_cast<flac_extent *>(result));
+    close_stream(&stream);
+    return found;
+}
+
+constexpr scan_kind kScan = {sizeof(flac_extent), scan_file, nullptr};
 
 }  // namespace
 
 void *xflacfd_create(const mtsrc_io *io, int64_t * /*word*/, xflac_info *info,
                      void * /*reserved*/) {
     auto *r = static_cast<flac_reader *>(calloc(1, sizeof(flac_reader)));
-    if (r == nullptr || info == nullptr || !io_file_open(&r->file, io) || !open_decoder(r)) {
+    if (r != nullptr && info != nullptr && io_file_open(&r->file, io)) {
+        r->extent = static_cast<const flac_extent *>(scan_cache_get(&r->file, &kScan));
+    }
+    if (r == nullptr || r->extent == nullptr || !open_stream(&r->stream, &r->file)) {
         xflacfd_delete(r);
         return nullptr;
     }
-    info->sample_rate = r->rate;
-    info->duration = units_of_duration(r->end, r->rate);
+    r->stream.base = r->extent->base;
+    info->sample_rate = r->extent->rate;
+    info->duration = units_of_duration(r->extent->end, r->extent->rate);
     return r;
 }
 
 int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                         int64_t *second) {
-    flac_reader *r = reader_of(reader);
+    auto *r = static_cast<flac_reader *>(reader);
     if (r == nullptr || buf == nullptr || bytes == nullptr || first == nullptr ||
         second == nullptr || size < kPair) {
         return -1;
     }
-    if (r->next >= r->end) return kWexaEndOfStream;
-    if (r->moved && !find_sample(r, r->next)) {
+    flac_stream *s = &r->stream;
+    if (r->next >= r->extent->end) return kWexaEndOfStream;
+    if (r->moved && !find_sample(s, r->next)) {
         // Where no seek leads, reading goes on from the start, up to the place.
         r->file.failed = false;
-        if (!rewind_stream(r)) return -1;
+        if (!rewind_stream(s)) return -1;
     }
     r->moved = false;
     bool more = true;
-    while (more && (r->count == 0 || r->block + r->count <= r->next)) more = decode_block(r);
+    while (more && (s->count == 0 || s->block + s->count <= r->next)) more = decode_block(s);
     if (r->file.failed) return -1;
-    const int64_t inside = r->next - r->block;  // below 0 in silence before the block
-    const int64_t left = std::min<int64_t>(r->end - r->next, size / kPair);
-    const int64_t samples = std::min(left, !more ? left : inside < 0 ? -inside : r->count - inside);
+    const int64_t inside = r->next - s->block;  // below 0 in silence before the block
+    const int64_t left = std::min<int64_t>(r->extent->end - r->next, size / kPair);
+    const int64_t samples = std::min(left, !more ? left : inside < 0 ? -inside : s->count - inside);
     *bytes = static_cast<int32_t>(samples) * kPair;
     if (more && inside >= 0) {
-        memcpy(buf, r->pcm + 2 * inside, static_cast<size_t>(*bytes));
+        memcpy(buf, s->pcm + 2 * inside, static_cast<size_t>(*bytes));
     } else {
         memset(buf, 0, static_cast<size_t>(*bytes));
     }
-    *first = units_from_samples(r->next, r->rate);
-    *second = units_from_samples(samples, r->rate);
+    *first = units_from_samples(r->next, r->extent->rate);
+    *second = units_from_samples(samples, r->extent->rate);
     r->next += samples;
     return 0;
 }
 
 int32_t xflacfd_seek(void *reader, const int64_t *position, int64_t *reached) {
-    flac_reader *r = reader_of(reader);
+    auto *r = static_cast<flac_reader *>(reader);
     if (r == nullptr || position == nullptr || reached == nullptr) return -1;
-    r->next = seek_target(*position, r->end, r->rate);
-    *reached = units_from_samples(r->next, r->rate);
+    r->next = seek_target(*position, r->extent->end, r->extent->rate);
+    *reached = units_from_samples(r->next, r->extent->rate);
     r->moved = true;
     return 0;
 }
 
 void xflacfd_delete(void *reader) {
-    flac_reader *r = reader_of(reader);
+    auto *r = static_cast<flac_reader *>(reader);
     if (r == nullptr) return;
-    if (r->decoder != nullptr) FLAC__stream_decoder_delete(r->decoder);
-    free(r->pcm);
+    close_stream(&r->stream);
+    scan_cache_put(r->extent);
     io_file_close(&r->file);
     free(r);
 }

@@ -12,6 +12,10 @@ constexpr int32_t kMaxBoxes = 65536;    // of one level; a file that has more is
 constexpr int64_t kFullHead = 4;        // bytes: version and flags of a box that has them
 constexpr int64_t kMaxTable = 1 << 26;  // bytes; more than the frames of a day take
 
+// Bytes of the file for each frame that it is believed to have. The shortest AAC frame of silence
+// has 4, and 4 more in the tables; frames that share their bytes would take memory without limit.
+constexpr int64_t kMinFrameBytes = 2;
+
 constexpr uint32_t name_of(const char (&text)[5]) {
     uint32_t name = 0;
     for (int i = 0; i < 4; ++i) name = name << 8 | static_cast<uint8_t>(text[i]);
@@ -30,13 +34,20 @@ struct box {
     span body;
 };
 
+// Bytes of a track's frames in fragments that state none.
+struct frame_default {
+    uint32_t track_id;
+    uint32_t bytes;
+};
+
 struct parser {
     io_file *file;
     stream_info *info;
     mp4_codec *codec;
-    uint32_t track_id;  // of the audio track
-    span extends;       // defaults of fragments
-    bool ended;         // a frame was not there: the list ends before it
+    uint32_t track_id;                   // of the audio track
+    frame_default defaults[kMaxTracks];  // default_count used
+    int32_t default_count;
+    bool ended;  // a frame was not there: the list ends before it
 };
 
 // Unsigned, big-endian; 0 where the file has no such bytes.
@@ -134,11 +145,14 @@ void read_codec(const parser &p, span stsd) {
     if (entry.name == name_of("mp4a") && esds.to > 0) read_esds(p, esds);
 }
 
-// A frame without bytes is none. False when out of memory.
+// Skips a frame without bytes. False when out of memory and when the frames are too many for the
+// file.
 bool add_frame(parser *p, int64_t offset, int64_t bytes) {
     if (bytes == 0) return true;
+    frame_index *frames = &p->info->frames;
     p->ended = offset < 0 || bytes < 0 || bytes > INT32_MAX || offset > p->file->size - bytes;
-    return p->ended || frame_index_add(&p->info->frames, offset, static_cast<int32_t>(bytes), 0);
+    return p->ended || (frames->count < p->file->size / kMinFrameBytes &&
+                        frame_index_add(frames, offset, static_cast<int32_t>(bytes), 0));
 }
 
 // A table box's contents behind version and flags, in memory: the tables are read in step, and may
@@ -208,7 +222,8 @@ bool add_chunks(parser *p, const tables &t) {
     int64_t frame = 0;
     for (int64_t chunk = 1; chunk <= chunks && frame < t.count && !p->ended; ++chunk) {
         while (run + 24 <= t.runs.bytes && value(t.runs, run + 12, 4) <= chunk) run += 12;
-        int64_t offset = value(t.chunks, 4 + (chunk - 1) * t.chunk_width, t.chunk_width);
+        const int64_t at = 4 + (chunk - 1) * t.chunk_width;
+        int64_t offset = std::min(value(t.chunks, at, t.chunk_width), p->file->size);
         const int64_t end = std::min(frame + value(t.runs, run + 4, 4), t.count);
         for (; frame < end && !p->ended; ++frame) {
             const int64_t bytes = size_of(t, frame);
@@ -228,19 +243,24 @@ bool read_tables(parser *p, span stbl) {
     return ok;
 }
 
-// Bytes of a fragment's frame that states none.
-uint32_t default_size(const parser *p, uint32_t track_id) {
+// Reads the tracks' defaults of fragments from the box "mvex".
+void read_defaults(parser *p, span mvex) {
     box trex = {};
-    span level = p->extends;
-    for (int32_t i = 0; i < kMaxBoxes && next_box(p->file, &level, &trex); ++i) {
-        if (trex.name == name_of("trex") && be32(p->file, trex.body.from + kFullHead) == track_id) {
-            return be32(p->file, trex.body.from + kFullHead + 12);
-        }
+    for (int32_t i = 0; i < kMaxBoxes && next_box(p->file, &mvex, &trex); ++i) {
+        if (trex.name != name_of("trex") || p->default_count == kMaxTracks) continue;
+        const int64_t at = trex.body.from + kFullHead;
+        p->defaults[p->default_count++] = {be32(p->file, at), be32(p->file, at + 12)};
+    }
+}
+
+uint32_t default_size(const parser *p, uint32_t track_id) {
+    for (int32_t i = 0; i < p->default_count; ++i) {
+        if (p->defaults[i].track_id == track_id) return p->defaults[i].bytes;
     }
     return 0;
 }
 
-// One run of frames of a track in a fragment; *offset moves on behind them.
+// Reads one run of frames of a track in a fragment; *offset moves to the end of the frames.
 bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64_t *offset) {
     const uint32_t flags = be32(p->file, run.from);
     const int64_t count = be32(p->file, run.from + kFullHead);
@@ -254,11 +274,15 @@ bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64
     const bool sized = (flags & 0x200) != 0;
     const int64_t entry =
         before + (sized ? 4 : 0) + ((flags & 0x400) != 0 ? 4 : 0) + ((flags & 0x800) != 0 ? 4 : 0);
+    const int64_t end = p->file->size;
+    if (!sized && (size == 0 || !ours)) {  // nothing but the file bounds the count
+        *offset = std::min(*offset, end) + (size > 0 ? std::min(count, end / size + 1) * size : 0);
+        return true;
+    }
     for (int64_t i = 0; i < count && at + entry <= run.to && !p->ended; ++i, at += entry) {
         const int64_t bytes = sized ? be32(p->file, at + before) : size;
-        if (bytes == 0 && !sized) break;  // nothing need bound the count
         if (ours && !add_frame(p, *offset, bytes)) return false;
-        *offset = std::min(*offset, p->file->size) + bytes;
+        *offset = std::min(*offset, end) + bytes;
     }
     return true;
 }
@@ -323,14 +347,17 @@ bool read_movie(parser *p, span moov) {
         const bool known = p->codec->is_aac || p->codec->is_mpeg;
         if (known && !read_tables(p, stbl)) return false;
     }
-    p->extends = find(file, moov, name_of("mvex"));
+    read_defaults(p, find(file, moov, name_of("mvex")));
     return true;
 }
 
 }  // namespace
 
 bool mp4_read_boxes(io_file *file, stream_info *info, mp4_codec *codec) {
-    parser p = {file, info, codec, 0, {0, 0}, false};
+    parser p = {};
+    p.file = file;
+    p.info = info;
+    p.codec = codec;
     const span all = {0, file->size};
     const span moov = find(file, all, name_of("moov"));
     info->track = -1;

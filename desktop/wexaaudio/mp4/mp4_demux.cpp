@@ -32,17 +32,20 @@ bool learn_mpeg(io_file *file, stream_info *info) {
     return true;
 }
 
-bool scan_file(io_file *file, const codec_library *library, stream_info *info) {
+bool scan_file(io_file *file, void *result) {
+    auto *info = static_cast<stream_info *>(result);
     mp4_codec codec = {};
     if (!mp4_read_boxes(file, info, &codec)) return false;
-    if (codec.is_aac) return aac_stream_learn(file, library, &codec.config, info);
+    if (codec.is_aac) return aac_stream_learn(file, &codec.config, info);
     return !codec.is_mpeg || learn_mpeg(file, info);  // the source refuses any other codec
 }
+
+constexpr scan_kind kScan = {sizeof(stream_info), scan_file, stream_info_release};
 
 }  // namespace
 
 void *xmp4fd_create(const mtsrc_io *io, int32_t * /*word*/, xmp4_info *info, void * /*reserved*/) {
-    stream_reader *r = info != nullptr ? stream_open(io, scan_file) : nullptr;
+    stream_reader *r = info != nullptr ? stream_open(io, &kScan) : nullptr;
     if (r == nullptr) return nullptr;
     info->track_count = r->info->track_count;
     memcpy(info->kind, r->info->kind, sizeof info->kind);
@@ -51,7 +54,7 @@ void *xmp4fd_create(const mtsrc_io *io, int32_t * /*word*/, xmp4_info *info, voi
 }
 
 void xmp4fd_delete(void *demux) {
-    stream_close(static_cast<stream_reader *>(demux));
+    stream_close(demux);
 }
 
 void *xmp4fds_open(void *demux, int32_t track, void * /*reserved*/) {
@@ -75,9 +78,9 @@ int32_t xmp4fds_get_info_aud(void *stream, xmp4_track *track) {
 
 int32_t xmp4fds_get_frm(void *stream, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                         int64_t *second) {
-    return stream_read(static_cast<stream_reader *>(stream), buf, size, bytes, first, second);
+    return stream_read(stream, buf, size, bytes, first, second);
 }
 
 int32_t xmp4fds_seek(void *stream, const int64_t *position, int64_t *reached, int32_t /*flags*/) {
-    return stream_seek(static_cast<stream_reader *>(stream), position, reached);
+    return stream_seek(stream, position, reached);
 }

@@ -80,3 +80,15 @@ bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes) {
     }
     return kVbriAt + 4 <= bytes && memcmp(p + kVbriAt, "VBRI", 4) == 0;
 }
+
+void mpeg_describe(const mpeg_header *head, stream_info *info) {
+    info->codec = "mp3float";  // all three layers
+    info->rate = head->rate;
+    info->channels = head->channels;
+    info->out_channels = head->channels;
+    // The filter bank's memory spans two frames at most (Layer I; Layer III of MPEG-2). One more is
+    // margin, since it costs next to nothing.
+    info->preroll = 3;
+    info->reservoir = head->layer == 3 ? kMpegMaxBackstep : 0;
+    info->overhead = mpeg_main_data_at(head);
+}

@@ -96,27 +96,30 @@ bool read_pages(page_reader *r, ogg_scan *scan) {
     return true;
 }
 
-bool scan_file(io_file *file, const codec_library *library, stream_info *info) {
+bool scan_file(io_file *file, void *result) {
+    auto *info = static_cast<stream_info *>(result);
     page_reader r = {{}, file, 0, 0};
     ogg_sync_init(&r.sync);
     ogg_scan scan = {};
     scan.file = file;
-    scan.library = library;
+    scan.library = codec_library_get();
     scan.info = info;
     info->track = -1;
     info->out_channels = 1;
     info->preroll = 1;  // what a packet overlaps with
     const bool is_vorbis = read_pages(&r, &scan) && info->codec != nullptr && ogg_scan_end(&scan);
     if (!is_vorbis) info->codec = nullptr;
-    library->parser_close(scan.parser);
+    scan.library->parser_close(scan.parser);
     ogg_sync_clear(&r.sync);
     return !file->failed && info->track_count > 0;
 }
 
+constexpr scan_kind kScan = {sizeof(stream_info), scan_file, stream_info_release};
+
 }  // namespace
 
 void *xoggd_create(const mtsrc_io *io, int64_t * /*word*/, xogg_info *info, void * /*reserved*/) {
-    stream_reader *r = info != nullptr ? stream_open(io, scan_file) : nullptr;
+    stream_reader *r = info != nullptr ? stream_open(io, &kScan) : nullptr;
     if (r == nullptr) return nullptr;
     info->stream_count = r->info->track_count;
     memcpy(info->kind, r->info->kind, sizeof info->kind);
@@ -125,7 +128,7 @@ void *xoggd_create(const mtsrc_io *io, int64_t * /*word*/, xogg_info *info, void
 }
 
 void xoggd_delete(void *demux) {
-    stream_close(static_cast<stream_reader *>(demux));
+    stream_close(demux);
 }
 
 void *xoggds_open(void *demux, int32_t index, void * /*reserved*/) {
@@ -153,9 +156,9 @@ int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
 
 int32_t xoggds_get_frm(void *stream, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                        int64_t *second) {
-    return stream_read(static_cast<stream_reader *>(stream), buf, size, bytes, first, second);
+    return stream_read(stream, buf, size, bytes, first, second);
 }
 
 int32_t xoggds_seek(void *stream, const int64_t *position, int64_t *reached, int32_t /*flags*/) {
-    return stream_seek(static_cast<stream_reader *>(stream), position, reached);
+    return stream_seek(stream, position, reached);
 }

@@ -7,12 +7,13 @@
 
 namespace {
 
-constexpr int32_t kNameBytes = 7;           // packet type and "vorbis"
-constexpr int32_t kIdBytes = 30;            // of the identification packet
-constexpr int32_t kChannelsAt = 11;         // in it
-constexpr int32_t kRateAt = 12;             // likewise; 32-bit, little endian
-constexpr int32_t kMaxCodebooks = 1 << 20;  // bytes; usual ones have 3 to 10 thousand
-constexpr int32_t kMaxPacket32 = 1 << 26;   // bytes; comments may hold pictures
+constexpr int32_t kNameBytes = 7;               // packet type and "vorbis"
+constexpr int32_t kIdBytes = 30;                // of the identification packet
+constexpr int32_t kChannelsAt = 11;             // in it
+constexpr int32_t kRateAt = 12;                 // likewise; 32-bit, little endian
+constexpr int32_t kMaxCodebooks = 1 << 20;      // bytes; usual ones have 3 to 10 thousand
+constexpr int64_t kMaxGranule = INT64_MAX / 2;  // larger ones count as this: sums stay exact
+constexpr int32_t kMaxPacket32 = 1 << 26;       // bytes; comments may hold pictures
 
 // Stand in for the file's own comments, which no decoder needs and which may hold a picture.
 constexpr uint8_t kNoComments[] = {3, 'v', 'o', 'r', 'b', 'i', 's', 0, 0, 0, 0, 0, 0, 0, 0, 1};
@@ -144,7 +145,7 @@ bool ogg_scan_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
     if (missing || ogg_page_continued(page) == 0) scan->open = false;
     scan->gap = scan->gap || missing;
     scan->next_page = number + 1;
-    const int64_t granule = ogg_page_granulepos(page);
+    const int64_t granule = std::min<int64_t>(ogg_page_granulepos(page), kMaxGranule);
     if (granule >= 0) scan->page_end = frame_index_end(packets);
     if (!take_segments(scan, page, body_first)) return false;
     if (granule < 0 || packets->count == 0) return true;

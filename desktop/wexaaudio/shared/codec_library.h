@@ -35,11 +35,6 @@ struct codec_library {
     int32_t (*pcm)(const av_decoder *decoder, int32_t channels, int32_t skip, int32_t count,
                    int16_t *pcm);
 
-    // Decodes the blocks of the packet, which have no framing, up to the first that begins behind
-    // stop. begin receives the offset in the packet of each block that decodes, ascending, at most
-    // room of them. Returns their count. The decoder is left fresh.
-    int32_t (*split)(av_decoder *decoder, int32_t stop, int32_t *begin, int32_t room);
-
     // setup: the three header packets in Xiph's packing. Null on failure.
     vorbis_parser *(*parser_open)(const uint8_t *setup, int32_t setup_bytes);
     void (*parser_close)(vorbis_parser *parser);  // null is allowed

@@ -5,12 +5,15 @@
 
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
 
 namespace {
 
-struct cached_scan {
-    stream_info info;  // first: the address handed out is the record's
-    stream_scan scan;
+// A change within a tick of the file system's clock leaves the time of change as it is.
+constexpr time_t kSettled = 2;  // seconds
+
+struct alignas(max_align_t) cached_scan {  // its result follows
+    const scan_kind *kind;
     mtsrc_file *(*open)(const mtsrc_io *io, int32_t mode);
     struct stat file;
     bool shared;  // file is known
@@ -21,7 +24,7 @@ struct cached_scan {
 pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
 cached_scan *scans;  // under lock, as are users and next of each
 
-// False when the path does not tell what the callbacks read.
+// False when the path does not identify what the callbacks read.
 bool identify(const io_file *file, struct stat *known) {
     const char *path = file->io.path;
     return path != nullptr && strcmp(path, "fd") != 0 && stat(path, known) == 0 &&
@@ -29,13 +32,13 @@ bool identify(const io_file *file, struct stat *known) {
 }
 
 bool is_same(const cached_scan &a, const cached_scan &b) {
-    return a.scan == b.scan && a.open == b.open && a.file.st_dev == b.file.st_dev &&
+    return a.kind == b.kind && a.open == b.open && a.file.st_dev == b.file.st_dev &&
            a.file.st_ino == b.file.st_ino && a.file.st_size == b.file.st_size &&
-           a.file.st_mtim.tv_sec == b.file.st_mtim.tv_sec &&
-           a.file.st_mtim.tv_nsec == b.file.st_mtim.tv_nsec;
+           a.file.st_ctim.tv_sec == b.file.st_ctim.tv_sec &&
+           a.file.st_ctim.tv_nsec == b.file.st_ctim.tv_nsec;
 }
 
-// One more user of a scan like wanted; null without one.
+// Finds a scan like wanted and adds a user to it; null without one.
 cached_scan *find(const cached_scan &wanted) {
     pthread_mutex_lock(&lock);
     cached_scan *c = scans;
@@ -45,22 +48,43 @@ cached_scan *find(const cached_scan &wanted) {
     return c;
 }
 
+void release(cached_scan *c) {
+    if (c->kind->release != nullptr) c->kind->release(c + 1);
+    free(c);
+}
+
+// Removes the scans without users, except kept, from the list. Returns them as a list of their own.
+cached_scan *remove_unused(const cached_scan *kept) {
+    cached_scan *unused = nullptr;
+    for (cached_scan **link = &scans; *link != nullptr;) {
+        cached_scan *c = *link;
+        if (c->users > 0 || c == kept) {
+            link = &c->next;
+            continue;
+        }
+        *link = c->next;
+        c->next = unused;
+        unused = c;
+    }
+    return unused;
+}
+
 }  // namespace
 
-const stream_info *scan_cache_get(io_file *file, const codec_library *library, stream_scan scan) {
-    auto *c = static_cast<cached_scan *>(calloc(1, sizeof(cached_scan)));
+const void *scan_cache_get(io_file *file, const scan_kind *kind) {
+    auto *c = static_cast<cached_scan *>(calloc(1, sizeof(cached_scan) + kind->bytes));
     if (c == nullptr) return nullptr;
-    c->scan = scan;
+    c->kind = kind;
     c->open = file->io.open;
     c->users = 1;
     c->shared = identify(file, &c->file);
     cached_scan *other = c->shared ? find(*c) : nullptr;
     if (other != nullptr) {
         free(c);
-        return &other->info;
+        return other + 1;
     }
-    if (!scan(file, library, &c->info)) {
-        scan_cache_put(&c->info);
+    if (!kind->scan(file, c + 1)) {
+        release(c);
         return nullptr;
     }
     if (c->shared) {
@@ -69,19 +93,21 @@ const stream_info *scan_cache_get(io_file *file, const codec_library *library, s
         scans = c;
         pthread_mutex_unlock(&lock);
     }
-    return &c->info;
+    return c + 1;
 }
 
-void scan_cache_put(const stream_info *info) {
-    if (info == nullptr) return;
-    auto *c = reinterpret_cast<cached_scan *>(const_cast<stream_info *>(info));
+void scan_cache_put(const void *result) {
+    if (result == nullptr) return;
+    auto *c = static_cast<cached_scan *>(const_cast<void *>(result)) - 1;
+    if (!c->shared) return release(c);
+    const bool settled = time(nullptr) > c->file.st_ctim.tv_sec + kSettled;
     pthread_mutex_lock(&lock);
-    const bool unused = --c->users == 0;
-    cached_scan **place = &scans;
-    while (unused && *place != nullptr && *place != c) place = &(*place)->next;
-    if (unused && *place == c) *place = c->next;
+    --c->users;
+    cached_scan *unused = remove_unused(settled ? c : nullptr);
     pthread_mutex_unlock(&lock);
-    if (!unused) return;
-    stream_info_free(&c->info);
-    free(c);
+    while (unused != nullptr) {
+        cached_scan *next = unused->next;
+        release(unused);
+        unused = next;
+    }
 }

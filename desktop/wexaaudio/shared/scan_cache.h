@@ -1,17 +1,29 @@
-// The scans of files that are open, shared by their readers: a job reads one file through four.
+// Results of scanning files, shared by the readers of a file: a job opens one file five times.
 //
-// A file is known by its path's device, inode, size and time of change, so that a file replaced or
-// written to is scanned again. The last reader frees a scan: nothing is kept between jobs.
-// Callbacks that serve other paths, or none, are never shared.
+// A file is identified by its path's device, inode, size and time of change, so that a file that
+// was replaced or written to is scanned again. The result used last is kept for the next reader,
+// unless the file changed so shortly before that a further change could go unnoticed. Readers whose
+// callbacks serve other paths, or none, share nothing.
 #ifndef WEXAAUDIO_SCAN_CACHE_H
 #define WEXAAUDIO_SCAN_CACHE_H
 
-#include "desktop/wexaaudio/shared/stream.h"
+#include <cstddef>
 
-// The scan of an open file: another reader's, or a new one by scan. Null when that fails. Given
-// back with scan_cache_put. Any thread.
-const stream_info *scan_cache_get(io_file *file, const codec_library *library, stream_scan scan);
+#include "desktop/wexaaudio/shared/io_file.h"
 
-void scan_cache_put(const stream_info *info);  // null is allowed
+// One format's scan. The record that describes it is its identity and stays valid.
+struct scan_kind {
+    size_t bytes;  // of a result
+    // Fills in a zeroed result. False when the file is not of the format or cannot be read, and
+    // when out of memory; what the result owns by then is released by the caller.
+    bool (*scan)(io_file *file, void *result);
+    void (*release)(void *result);  // frees what a result owns; null when it owns nothing
+};
+
+// The result for an open file, read-only: another reader's, or of a new scan. Null when the scan
+// fails. Returned with scan_cache_put. Any thread.
+const void *scan_cache_get(io_file *file, const scan_kind *kind);
+
+void scan_cache_put(const void *result);  // null is allowed
 
 #endif

@@ -4,7 +4,6 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "desktop/wexaaudio/shared/scan_cache.h"
 #include "desktop/wexaaudio/shared/units.h"
 #include "media_source/wexaaudio.h"
 
@@ -53,20 +52,21 @@ int32_t decode_next(stream_reader *r) {
 
 }  // namespace
 
-stream_reader *stream_open(const mtsrc_io *io, stream_scan scan) {
+stream_reader *stream_open(const mtsrc_io *io, const scan_kind *kind) {
     auto *r = static_cast<stream_reader *>(calloc(1, sizeof(stream_reader)));
     if (r == nullptr) return nullptr;
     r->fresh = true;
     r->library = codec_library_get();
     if (r->library != nullptr && io_file_open(&r->file, io)) {
-        r->info = scan_cache_get(&r->file, r->library, scan);
+        r->info = static_cast<const stream_info *>(scan_cache_get(&r->file, kind));
     }
     if (r->info != nullptr) return r;
     stream_close(r);
     return nullptr;
 }
 
-void stream_close(stream_reader *r) {
+void stream_close(void *reader) {
+    auto *r = static_cast<stream_reader *>(reader);
     if (r == nullptr) return;
     if (r->decoder != nullptr) r->library->close(r->decoder);
     scan_cache_put(r->info);
@@ -79,8 +79,9 @@ int64_t stream_duration(const stream_reader *r) {
     return r->info->rate > 0 ? units_of_duration(std::max<int64_t>(samples, 0), r->info->rate) : 0;
 }
 
-int32_t stream_read(stream_reader *r, void *buf, int32_t size, int32_t *bytes, int64_t *first,
+int32_t stream_read(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                     int64_t *second) {
+    auto *r = static_cast<stream_reader *>(reader);
     if (r == nullptr || buf == nullptr || bytes == nullptr || first == nullptr ||
         second == nullptr || r->info->codec == nullptr) {
         return -1;
@@ -110,7 +111,8 @@ int32_t stream_read(stream_reader *r, void *buf, int32_t size, int32_t *bytes, i
     return 0;
 }
 
-int32_t stream_seek(stream_reader *r, const int64_t *position, int64_t *reached) {
+int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached) {
+    auto *r = static_cast<stream_reader *>(reader);
     if (r == nullptr || position == nullptr || reached == nullptr || r->info->codec == nullptr) {
         return -1;
     }
@@ -152,9 +154,9 @@ bool stream_set_up(stream_info *info, const uint8_t *setup, int32_t bytes) {
     return info->setup != nullptr;
 }
 
-void stream_info_free(stream_info *info) {
+void stream_info_release(void *result) {
+    auto *info = static_cast<stream_info *>(result);
     frame_index_free(&info->frames);
     frame_index_free(&info->pages);
     free(info->setup);
-    info->setup = nullptr;
 }

@@ -11,6 +11,7 @@
 #include "desktop/wexaaudio/shared/codec_library.h"
 #include "desktop/wexaaudio/shared/frame_index.h"
 #include "desktop/wexaaudio/shared/io_file.h"
+#include "desktop/wexaaudio/shared/scan_cache.h"
 
 constexpr int32_t kMaxTracks = 64;
 
@@ -45,37 +46,36 @@ struct stream_info {
     int32_t track;             // the one that is read; -1 without one
 };
 
-// Fills in a zeroed record. False when the file is none of the format, cannot be read, or memory
-// runs out; what was allocated is then released by the caller.
-using stream_scan = bool (*)(io_file *file, const codec_library *library, stream_info *info);
-
 struct stream_reader {
     io_file file;
     const codec_library *library;
-    const stream_info *info;  // shared, see scan_cache.h
+    const stream_info *info;  // shared by the readers of the file
     av_decoder *decoder;      // owned; null until the first read
     int64_t next;             // frame read next
     int32_t skip;             // sample frames cut from its front
     bool fresh;               // it needs a fresh decoder
 };
 
+// The functions below take this reader as the interface's handle, which has no type.
+//
 // Null when the file cannot be read as the format, when libavcodec is missing, and when out of
 // memory. Released with stream_close.
-stream_reader *stream_open(const mtsrc_io *io, stream_scan scan);
+// kind: its results are stream_info records.
+stream_reader *stream_open(const mtsrc_io *io, const scan_kind *kind);
 
-void stream_close(stream_reader *reader);  // null is allowed
+void stream_close(void *reader);  // null is allowed
 
 // 100-ns units.
 int64_t stream_duration(const stream_reader *reader);
 
 // The next frame that gives samples: a frame that does not decode gives silence. Returns 0, 1 at
 // the end, -1 on failure. first and second: start and length, 100-ns units.
-int32_t stream_read(stream_reader *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
+int32_t stream_read(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                     int64_t *second);
 
 // Moves to the first sample at or after position (100-ns units), at most to the end. Returns 0, -1
 // on a bad argument.
-int32_t stream_seek(stream_reader *reader, const int64_t *position, int64_t *reached);
+int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached);
 
 // Copies bytes at an offset of the frames' kind. Returns the bytes copied, fewer when the pages or
 // the file end before, -1 on a read error.
@@ -85,6 +85,7 @@ int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint
 // Hands set-up data over as a copy. False when out of memory.
 bool stream_set_up(stream_info *info, const uint8_t *setup, int32_t bytes);
 
-void stream_info_free(stream_info *info);
+// Releases what a scan's result owns.
+void stream_info_release(void *info);
 
 #endif

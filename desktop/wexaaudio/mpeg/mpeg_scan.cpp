@@ -1,17 +1,10 @@
-// Bare MPEG audio files, Layers I to III: one scan over the frame headers, past tags and garbage.
-//
-// In: mtsrc_io. Out: PCM, the information record.
-//
-// Positions of seeks and the duration count the PCM that the source delivers. Of a 44.1-kHz stereo
-// stream it drops the start of the first frame, so a sample lies that much later in what is
-// decoded. The times that come with the frames count what is decoded: 0 marks the first frame,
-// whole.
+#include "desktop/wexaaudio/mpeg/mpeg_scan.h"
+
 #include <algorithm>
 #include <cstring>
 
 #include "desktop/wexaaudio/mpeg/mpeg_header.h"
 #include "desktop/wexaaudio/shared/id3v2.h"
-#include "desktop/wexaaudio/shared/stream.h"
 #include "media_source/wexaaudio.h"
 
 namespace {
@@ -32,8 +25,12 @@ struct mpeg_scan {
     bool started;
 };
 
-// Bytes of the tag that ends at end; 0 without one.
+// Bytes of the tag that ends at end; 0 without one. Tags are walked backwards: what is not held is
+// read together with the bytes before it.
 int64_t tag_before(io_file *file, int64_t end) {
+    const bool held = end - kId3v1Bytes >= file->block_at;
+    int32_t got = 0;
+    if (!held) io_file_peek(file, std::max<int64_t>(end - kIoBlock, 0), 1, &got);
     const uint8_t *p = io_file_bytes(file, end - kId3v1Bytes, kId3v1Bytes);
     if (p == nullptr) return 0;
     if (memcmp(p, "TAG", 3) == 0) return kId3v1Bytes;
@@ -125,7 +122,8 @@ bool walk(mpeg_scan *s, frame_index *frames) {
     return !s->file->failed && frames->count > 0;
 }
 
-bool scan_file(io_file *file, const codec_library * /*library*/, stream_info *info) {
+bool scan_file(io_file *file, void *result) {
+    auto *info = static_cast<stream_info *>(result);
     mpeg_scan s = {file, find_end(file), 0, {}, false};
     if (!find_start(&s) || !walk(&s, &info->frames)) return false;
     mpeg_describe(&s.head, info);
@@ -137,37 +135,4 @@ bool scan_file(io_file *file, const codec_library * /*library*/, stream_info *in
 
 }  // namespace
 
-void mpeg_describe(const mpeg_header *head, stream_info *info) {
-    info->codec = "mp3float";  // all three layers
-    info->rate = head->rate;
-    info->channels = head->channels;
-    info->out_channels = head->channels;
-    // The filter bank's memory spans two frames at most (Layer I; Layer III of MPEG-2). One more is
-    // margin, since it costs next to nothing.
-    info->preroll = 3;
-    info->reservoir = head->layer == 3 ? kMpegMaxBackstep : 0;
-    info->overhead = mpeg_main_data_at(head);
-}
-
-void *xmp123fd_create(const mtsrc_io *io, int64_t * /*word*/, xmp123_info *info,
-                      void * /*reserved*/) {
-    stream_reader *r = info != nullptr ? stream_open(io, scan_file) : nullptr;
-    if (r == nullptr) return nullptr;
-    info->sample_rate = r->info->rate;
-    info->channels = r->info->channels;
-    info->duration = stream_duration(r);
-    return r;
-}
-
-int32_t xmp123fd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
-                         int64_t *second) {
-    return stream_read(static_cast<stream_reader *>(reader), buf, size, bytes, first, second);
-}
-
-int32_t xmp123fd_seek(void *reader, const int64_t *position, int64_t *reached) {
-    return stream_seek(static_cast<stream_reader *>(reader), position, reached);
-}
-
-void xmp123fd_delete(void *reader) {
-    stream_close(static_cast<stream_reader *>(reader));
-}
+const scan_kind kMpegScan = {sizeof(stream_info), scan_file, stream_info_release};

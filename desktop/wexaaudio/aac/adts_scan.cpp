@@ -1,13 +1,9 @@
-// AAC in ADTS or ADIF form behind an optional ID3v2 tag.
-//
-// In: mtsrc_io. Out: PCM, the information record. One scan of the frame headers at open finds every
-// frame.
+#include "desktop/wexaaudio/aac/adts_scan.h"
+
 #include <cstring>
 
 #include "desktop/wexaaudio/aac/aac_stream.h"
-#include "desktop/wexaaudio/aac/adif_scan.h"
 #include "desktop/wexaaudio/shared/id3v2.h"
-#include "media_source/wexaaudio.h"
 
 namespace {
 
@@ -96,43 +92,18 @@ bool make_config(io_file *file, const adts_header &first, const frame_entry &ent
     }
     const uint8_t *p = io_file_bytes(file, entry.offset, entry.bytes);
     return p != nullptr && entry.bytes > 0 && p[0] >> 5 == kProgramElement &&
-           aac_config_from_program(config, p, entry.bytes, 3, first.object_type,
-                                   first.rate_index) >= 0;
+           aac_config_from_program(config, p, entry.bytes, first.object_type, first.rate_index);
 }
 
-bool scan_file(io_file *file, const codec_library *library, stream_info *info) {
-    const int64_t start = id3v2_end(file);
-    const uint8_t *p = io_file_bytes(file, start, 4);
-    if (p == nullptr) return false;
+bool scan_file(io_file *file, void *result) {
+    auto *info = static_cast<stream_info *>(result);
     aac_config config = {};
     adts_header first = {};
-    const bool found = memcmp(p, "ADIF", 4) == 0
-                           ? adif_scan(file, library, start, &config, &info->frames)
-                           : scan_frames(file, start, &info->frames, &first) &&
-                                 make_config(file, first, info->frames.entry[0], &config);
-    return found && aac_stream_learn(file, library, &config, info);
+    return scan_frames(file, id3v2_end(file), &info->frames, &first) &&
+           make_config(file, first, info->frames.entry[0], &config) &&
+           aac_stream_learn(file, &config, info);
 }
 
 }  // namespace
 
-void *xaacfd_create(const mtsrc_io *io, int64_t * /*word*/, xaac_info *info, void * /*reserved*/) {
-    stream_reader *r = info != nullptr ? stream_open(io, scan_file) : nullptr;
-    if (r == nullptr) return nullptr;
-    info->sample_rate = r->info->rate;
-    info->channels = r->info->channels;
-    info->duration = stream_duration(r);
-    return r;
-}
-
-int32_t xaacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
-                       int64_t *second) {
-    return stream_read(static_cast<stream_reader *>(reader), buf, size, bytes, first, second);
-}
-
-int32_t xaacfd_seek(void *reader, const int64_t *position, int64_t *reached) {
-    return stream_seek(static_cast<stream_reader *>(reader), position, reached);
-}
-
-void xaacfd_delete(void *reader) {
-    stream_close(static_cast<stream_reader *>(reader));
-}
+const scan_kind kAdtsScan = {sizeof(stream_info), scan_file, stream_info_release};

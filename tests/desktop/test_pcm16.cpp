@@ -1,0 +1,48 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstring>
+#include <vector>
+
+#include "desktop/wexaaudio/av/pcm16.h"
+
+namespace {
+
+int16_t plain(float sample) {
+    if (std::isnan(sample)) return 0;
+    return static_cast<int16_t>(std::lrint(std::clamp(sample * 32768.0f, -32768.0f, 32767.0f)));
+}
+
+// A sample of all bit patterns, infinities and NaN among them, and all halves between two integers.
+TEST(Pcm16, ConvertsAsRoundingOneByOne) {
+    constexpr uint64_t kStep = 9973;
+    std::vector<float> left;
+    for (uint64_t bits = 0; bits <= UINT32_MAX; bits += kStep) {
+        left.push_back(0.0f);
+        memcpy(&left.back(), &bits, sizeof(float));
+    }
+    for (int half = -65'540; half <= 65'540; ++half) {
+        left.push_back(static_cast<float>(half) / 65'536.0f);
+    }
+    left.insert(left.end(), {INFINITY, -INFINITY, NAN});
+    const std::vector<float> right(left.rbegin(), left.rend());
+    const auto count = static_cast<int32_t>(left.size());
+    std::vector<int16_t> pairs(2 * left.size()), mean(left.size());
+    pcm16_pair(left.data(), right.data(), pairs.data(), count);
+    const uint8_t *planes[] = {reinterpret_cast<const uint8_t *>(left.data()),
+                               reinterpret_cast<const uint8_t *>(right.data()),
+                               reinterpret_cast<const uint8_t *>(left.data())};
+    for (int32_t channels = 1; channels <= 3; ++channels) {
+        pcm16_mean(planes, channels, 1, mean.data(), count - 1);
+        for (size_t i = 1; i < left.size(); ++i) {
+            const int l = plain(left[i]), r = plain(right[i]);
+            ASSERT_EQ(pairs[2 * i], l) << left[i];
+            ASSERT_EQ(pairs[2 * i + 1], r) << right[i];
+            const int sum = channels == 1 ? l : channels == 2 ? l + r : l + r + l;
+            ASSERT_EQ(mean[i - 1], sum / channels) << left[i] << ' ' << right[i];
+        }
+    }
+}
+
+}  // namespace
