@@ -9,6 +9,7 @@
 #include <iostream>
 #include <sstream>
 
+#include "cli/input/ffmpeg_process.h"
 #include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"
@@ -96,6 +97,7 @@ struct raw_values {
     std::string shard;
     std::string fps;
     bool null_separated = false;
+    bool no_ffmpeg = false;
 };
 
 // The parser takes a value in square brackets apart at its commas, which a file name must survive:
@@ -156,6 +158,8 @@ void declare_analysis(CLI::App &app, options &out, raw_values &raw) {
                    "Give up a file whose analysis takes longer; by default none is given up")
         ->check(whole(0, kMostSeconds, " of seconds"))
         ->type_name("SECONDS");
+    app.add_flag("--no-ffmpeg", raw.no_ffmpeg,
+                 "Decode nothing with the ffmpeg program, even if it is installed");
 }
 
 void declare_output(CLI::App &app, options &out, raw_values &raw) {
@@ -241,6 +245,7 @@ void set_values(const raw_values &raw, options &out) {
     unshield(out.output_dir);
     for (std::string &input : out.inputs) unshield(input);
     for (std::string &list : out.lists) unshield(list);
+    if (!raw.no_ffmpeg) out.ffmpeg = find_ffmpeg();
     if (raw.null_separated) out.list_separator = '\0';
 }
 

@@ -48,6 +48,7 @@ struct options {
     bool recursive = false;
     int32_t jobs = 1;
     int32_t timeout_s = 0;            // of one file's analysis, 0 for none
+    std::string ffmpeg;               // path of the program, empty to do without
     char list_separator = '\n';       // of the lists that name files
     std::vector<std::string> lists;   // files that name files, "-" for standard input
     std::vector<std::string> inputs;  // in the order given; "-" is a list on standard input

@@ -9,6 +9,7 @@ _arguments -s -S \
   '--max-minutes=[refuse audio that lasts longer]:number:' \
   '(-j --jobs)'{-j+,--jobs=}'[files analysed at once]:number:' \
   '--timeout=[give up a file whose analysis takes longer]:number:' \
+  '--no-ffmpeg[decode nothing with the ffmpeg program]' \
   '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive losslesscut ffmetadata edl fcpxml reaper)' \
   '(-o --output-dir)'{-o+,--output-dir=}'[folder for the marker files]:folder:_files -/' \
   '--fps=[frames a second for edl and fcpxml]:rate:(23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60)' \

@@ -14,7 +14,6 @@
 
 namespace {
 
-constexpr const char *kConvert = " ffmpeg -i FILE -ar 44100 NEW.flac converts it.";
 constexpr int64_t kMsPerMinute = 60'000;
 
 std::string seconds_text(int64_t ms) {
@@ -50,17 +49,16 @@ std::string explain_format(file_kind kind) {
             return "The file is not recognised as audio of a known format.";
         case file_kind::wav:
             return "The WAV file is damaged or is not 16-bit integer PCM at up to " +
-                   std::to_string(TAVO_MAX_RATE) + " Hz, which is all that is read." + kConvert;
+                   std::to_string(TAVO_MAX_RATE) + " Hz, which is all that is read.";
         case file_kind::mp4:
             return "The MP4 file's audio is neither AAC nor MP3, or its sample rate is not " +
-                   rates + "." + kConvert;
+                   rates + ".";
         case file_kind::asf:
         case file_kind::aiff:
         case file_kind::matroska:
-            return "The file is " + name + ", a format that is not read." + kConvert;
+            return "The file is " + name + ", a format that is not read.";
         default:
-            return "The " + name + " file has a sample rate that is not read; " + rates + " are." +
-                   kConvert;
+            return "The " + name + " file has a sample rate that is not read; " + rates + " are.";
     }
 }
 
@@ -76,8 +74,7 @@ std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream
             return explain_format(kind);
         case TAVO_ERR_OPEN:
             if (kind != file_kind::ogg) return subject + "has no usable audio stream.";
-            return "The Ogg file has no usable audio stream; only Vorbis is read from Ogg." +
-                   std::string(kConvert);
+            return "The Ogg file has no usable audio stream; only Vorbis is read from Ogg.";
         case TAVO_ERR_READ:
             return subject + "cannot be read or decoded.";
         case TAVO_ERR_CODEC:
@@ -87,7 +84,7 @@ std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream
                    " s and must last more than 1 s.";
         case TAVO_ERR_LOW_RATE:
             return "The sample rate is too low: it is " + std::to_string(stream.rate) +
-                   " Hz and must be at least " + std::to_string(TAVO_MIN_RATE) + " Hz." + kConvert;
+                   " Hz and must be at least " + std::to_string(TAVO_MIN_RATE) + " Hz.";
         default:
             return subject + "cannot be used: " + tavo_error_text(code) + ".";
     }

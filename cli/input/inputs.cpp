@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cerrno>
 
+#include "cli/input/ffmpeg.h"
 #include "cli/input/recognise.h"
 #include "cli/input/short_path.h"
 #include "cli/write/file_names.h"
@@ -111,11 +112,12 @@ bool leave_folder(input_supply &supply, input &out) {
 }
 
 // Whether the file is to be analysed or reported; code receives errno when it cannot be read.
-bool is_audio(const std::string &path, int &code) {
+bool is_audio(const std::string &path, const options &opts, int &code) {
     file_kind kind = file_kind::unknown;
     code = recognise(path, kind);
     if (code != 0) return code == EACCES || code == EPERM || code == EIO;
     if (kind != file_kind::unknown) return true;
+    if (!opts.ffmpeg.empty() && has_media_suffix(path)) return true;
     // The library finds MPEG audio also after other bytes.
     short_path opened = open_short_path(path);
     const int32_t probed = tavo_probe(opened.path.c_str(), nullptr);
@@ -134,7 +136,7 @@ bool take_entry(input_supply &supply, input &out) {
     }
     if (!S_ISREG(info.st_mode)) return false;
     int code = 0;
-    if (!is_audio(path, code)) {
+    if (!is_audio(path, supply.opts, code)) {
         ++supply.skipped;
         return false;
     }

@@ -1,5 +1,6 @@
 #include "cli/run/analyse.h"
 
+#include <fcntl.h>
 #include <poll.h>
 #include <sys/resource.h>
 #include <unistd.h>
@@ -8,8 +9,8 @@
 #include <cerrno>
 
 #include "cli/input/explain.h"
+#include "cli/input/ffmpeg_process.h"
 #include "cli/input/player_offset.h"
-#include "cli/input/short_path.h"
 #include "cli/write/click.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
@@ -77,7 +78,7 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
         return;
     }
     int done_pipe[2];
-    if (pipe(done_pipe) != 0) {
+    if (pipe2(done_pipe, O_CLOEXEC) != 0) {
         out.error = system_sentence("The analysis could not be started", errno);
         tavo_deinit(ctx);
         return;
@@ -99,42 +100,58 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
     close(done_pipe[1]);
 }
 
-void analyse_opened(const short_path &opened, const options &opts, int stop_fd, record &out) {
-    const TAVO_PARAM param = {opened.path.c_str(), opts.mode};
+void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out) {
+    const TAVO_PARAM param = {song.path.c_str(), opts.mode};
     int32_t code = TAVO_OK;
     TAVO_CTX *ctx = tavo_init(&param, &code);
-    if (ctx == nullptr) {
-        out.error = explain_refusal(opened.path, code, out).sentence;
+    if (ctx != nullptr) {
+        run_job(ctx, opts, stop_fd, out);
+        out.offset_ms = find_player_offset_ms(song.path, out.sample_rate, out.channels);
         return;
     }
-    run_job(ctx, opts, stop_fd, out);
-    out.offset_ms = find_player_offset_ms(opened.path, out.sample_rate, out.channels);
+    failure failed;
+    if (needs_ffmpeg(song)) {
+        failed = decode_song(out.file, opts, stop_fd, song);
+        if (!failed) {
+            out.decoder = "ffmpeg";
+            return analyse_opened(opts, stop_fd, song, out);
+        }
+    }
+    out.error = explain_refusal(song.path, code, out).sentence;
+    if (failed) out.error += " " + failed.sentence;
+    if (is_stop_requested(stop_fd)) out.status = outcome::stopped;
 }
 
-// Of this process, all threads: user and system.
+// Of this process, all threads, and of the ffmpeg processes that it ran: user and system.
 int64_t cpu_time_ms() {
-    rusage used{};
-    getrusage(RUSAGE_SELF, &used);
-    const auto ms = [](const timeval &time) { return 1000 * time.tv_sec + time.tv_usec / 1000; };
-    return ms(used.ru_utime) + ms(used.ru_stime);
+    int64_t sum = 0;
+    for (const auto who : {RUSAGE_SELF, RUSAGE_CHILDREN}) {
+        rusage used{};
+        getrusage(who, &used);
+        for (const timeval &time : {used.ru_utime, used.ru_stime}) {
+            sum += 1000 * time.tv_sec + time.tv_usec / 1000;
+        }
+    }
+    return sum;
 }
 
 }  // namespace
 
-record analyse(const std::string &path, const options &opts, int stop_fd) {
-    record out = failed_record(path, opts.mode, check_file(path).sentence);
+record analyse(const std::string &path, const options &opts, int stop_fd, song_file &song) {
+    record out = failed_record(path, opts.mode, open_song(path, stop_fd, song).sentence);
     out.length_s = opts.length_s;
-    if (!out.error.empty()) return out;
+    if (!out.error.empty()) {
+        if (is_stop_requested(stop_fd)) out.status = outcome::stopped;
+        return out;
+    }
 
     click_file click;
     out.error = begin_click(click, opts.click, path, opts.force);
     if (!out.error.empty()) return out;
 
-    short_path opened = open_short_path(path);
     const int64_t before_ms = cpu_time_ms();
-    analyse_opened(opened, opts, stop_fd, out);
+    analyse_opened(opts, stop_fd, song, out);
     out.cpu_ms = cpu_time_ms() - before_ms;
-    close_short_path(opened);
     const std::string error = finish_click(click, out.status == outcome::ok);
     if (!error.empty()) {
         out.status = outcome::failed;

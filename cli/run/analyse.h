@@ -7,11 +7,13 @@
 
 #include <string>
 
+#include "cli/input/song_file.h"
 #include "cli/options.h"
 #include "cli/run/record.h"
 
 // stop_fd: becoming readable or closed at its other end stops the analysis through tavo_deinit.
-// Returns when the file's job has ended.
-record analyse(const std::string &path, const options &opts, int stop_fd);
+// Returns when the file's job has ended. song receives the sound that was analysed, if path could
+// be opened; the caller closes it.
+record analyse(const std::string &path, const options &opts, int stop_fd, song_file &song);
 
 #endif

@@ -33,6 +33,8 @@ struct record {
     int32_t bpm = 0;
     std::vector<float> beats_ms;  // ascending, from the start of the file
 
+    std::string decoder;  // "ffmpeg" if that program decoded the file, else empty
+
     int64_t cpu_ms = -1;  // processor time of the analysis, all threads; -1 without one
 
     std::string written;  // the file that holds the result, where the format makes one

@@ -23,8 +23,8 @@ constexpr int kLargestHeapBlock = 32 << 20;  // bytes; the most that malloc take
 constexpr int kFreeMemoryKept = 64 << 20;    // bytes
 
 // The result that the store had, or that of an analysis.
-record find_result(const request &asked, const options &opts, int stop_fd) {
-    if (asked.stored.empty()) return analyse(asked.path, opts, stop_fd);
+record find_result(const request &asked, const options &opts, int stop_fd, song_file &song) {
+    if (asked.stored.empty()) return analyse(asked.path, opts, stop_fd, song);
     record out;
     try {
         out = record_from_json(asked.stored);
@@ -96,11 +96,13 @@ record analyse_and_write(const request &asked, const options &opts, int stop_fd,
         is_kept = each.refusal.empty();
         if (!is_kept) return failed_record(asked.path, opts.mode, each.refusal);
     }
-    record out = find_result(asked, opts, stop_fd);
+    song_file song;
+    record out = find_result(asked, opts, stop_fd, song);
     const bool is_ok = out.status == outcome::ok;
     for (const companion &each : companions) {
         if (each.wanted && out.status == outcome::ok) each.write(out);
     }
+    close_song(song);
     is_kept = !is_ok || out.status == outcome::ok;
     return out;
 }

@@ -19,6 +19,7 @@ std::string json_record(const record &result) {
         object["duration_ms"] = result.duration_ms;
         object["offset_ms"] = result.offset_ms;
     }
+    if (!result.decoder.empty()) object["decoder"] = result.decoder;
     if (result.has_highlight) {
         object["hl_pos_ms"] = result.hl_pos_ms;
         if (result.length_s > 0) {
@@ -46,6 +47,7 @@ record record_from_json(const std::string &text) {
     out.channels = object.value("channels", 0);
     out.duration_ms = object.value("duration_ms", int64_t{0});
     out.offset_ms = object.value("offset_ms", 0.0);
+    out.decoder = object.value("decoder", "");
     out.has_highlight = object.contains("hl_pos_ms");
     out.hl_pos_ms = object.value("hl_pos_ms", 0);
     out.has_beats = object.contains("bpm");

@@ -27,8 +27,8 @@ REFUSED = {  # content when it is a file of ours, a part of the sentence
     "empty.wav": (b"", "empty"),
     "fifteen.wav": (b"RIFF\0\0\0\0WAVEfmt", "too short to be audio: it has 15 bytes"),
     "text.wav": (b"This is a letter, not a song.\n" * 99, "not recognised"),
-    "movie.wma": (ASF + bytes(500), "ASF (Windows Media), a format that is not read. ffmpeg -i"),
-    "24.wav": (wav(bits=24), "not 16-bit integer PCM at up to 48000 Hz, which is all that is read. ffmpeg -i FILE"),
+    "movie.wma": (ASF + bytes(500), "ASF (Windows Media), a format that is not read. ffmpeg, which may"),
+    "24.wav": (wav(bits=24), "not 16-bit integer PCM at up to 48000 Hz, which is all that is read."),
     "96k.wav": (wav(rate=96000), "48000 Hz"),
     "1s.wav": (wav(seconds=1.0), "lasts 1.000 s"), "7999.wav": (wav(rate=7999), "7999 Hz"),
     "no-channels.wav": (wav(seconds=0.0)[:22] + b"\0\0" + wav()[24:], "WAV file is damaged or"),
@@ -117,7 +117,7 @@ class Results(Case):
         (self.folder / "secret.wav").chmod(0)
         (self.folder / "closed").chmod(0)
         self.addCleanup(os.chmod, self.folder / "closed", 0o700)
-        done = self.run_tavo("--format", "json", *REFUSED, status=1, before=AS_ORDINARY_USER)
+        done = self.run_tavo("--no-ffmpeg", "--format", "json", *REFUSED, status=1, before=AS_ORDINARY_USER)
         messages = done.stderr.decode().splitlines()
         results = self.objects(done.stdout)
         for result, message, (name, (_, said)) in zip(results, messages, REFUSED.items(), strict=True):

@@ -1,0 +1,112 @@
+#include "cli/input/song_file.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/mman.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <charconv>
+#include <cstring>
+
+#include "cli/input/explain.h"
+#include "cli/input/ffmpeg.h"
+#include "cli/input/short_path.h"
+#include "cli/write/value_text.h"
+#include "include/tavo.h"
+
+namespace {
+
+constexpr off_t kMostPipeBytes = off_t{4} << 30;  // memory for what comes through a pipe
+
+// The descriptor that a path of the system names, -1 if it names none.
+int named_descriptor(const std::string &path) {
+    if (path == "/dev/stdin") return STDIN_FILENO;
+    for (const char *folder : {"/dev/fd/", "/proc/self/fd/"}) {
+        const size_t size = strlen(folder);
+        int fd = -1;
+        if (path.compare(0, size, folder) != 0) continue;
+        const char *end = path.data() + path.size();
+        if (std::from_chars(path.data() + size, end, fd).ptr == end) return fd;
+    }
+    return -1;
+}
+
+// A pipe or socket that the command was started with. Its own ones close on exec.
+bool is_inherited_pipe(int fd) {
+    struct stat info {};
+    return fd >= 0 && fstat(fd, &info) == 0 && (S_ISFIFO(info.st_mode) || S_ISSOCK(info.st_mode)) &&
+           (fcntl(fd, F_GETFD) & FD_CLOEXEC) == 0;
+}
+
+// Copies a pipe to its end. Returns 0 or errno; ECANCELED after a stop.
+int copy_pipe(int from, int to, int stop_fd) {
+    std::array<char, 65536> part;
+    for (off_t bytes = 0; bytes <= kMostPipeBytes;) {
+        std::array<pollfd, 2> watched = {{{from, POLLIN, 0}, {stop_fd, POLLIN, 0}}};
+        if (poll(watched.data(), watched.size(), -1) < 0) continue;  // EINTR
+        if (watched[1].revents != 0) return ECANCELED;
+        const ssize_t got = read(from, part.data(), part.size());
+        if (got == 0) return 0;
+        if (got < 0 && errno != EINTR && errno != EAGAIN) return errno;
+        for (ssize_t done = 0; done < got;) {
+            const ssize_t written = write(to, part.data() + done, static_cast<size_t>(got - done));
+            if (written < 0 && errno != EINTR) return errno;
+            if (written > 0) done += written;
+        }
+        if (got > 0) bytes += got;
+    }
+    return EFBIG;
+}
+
+failure read_inherited_pipe(int from, int stop_fd, song_file &song) {
+    const int fd = memfd_create("song", MFD_CLOEXEC);
+    int code = fd < 0 ? errno : copy_pipe(from, fd, stop_fd);
+    struct stat info {};
+    if (code == 0 && fstat(fd, &info) != 0) code = errno;
+    if (code == 0 && info.st_size >= TAVO_MIN_FILE_BYTES) {
+        song = {"/proc/self/fd/" + std::to_string(fd), fd, false};
+        return {};
+    }
+    if (fd >= 0) close(fd);
+    if (code == ECANCELED) return {"The analysis was stopped."};
+    if (code != 0) return {system_sentence("The pipe cannot be read into memory", code)};
+    return {"Only " + std::to_string(info.st_size) + " bytes came through the pipe."};
+}
+
+}  // namespace
+
+failure open_song(const std::string &path, int stop_fd, song_file &song) {
+    const int inherited = named_descriptor(path);
+    if (is_inherited_pipe(inherited)) return read_inherited_pipe(inherited, stop_fd, song);
+    if (failure failed = check_file(path)) return failed;
+    const short_path opened = open_short_path(path);
+    song = {opened.path, opened.fd, false};
+    return {};
+}
+
+bool needs_ffmpeg(const song_file &song) {
+    const int32_t code = song.by_ffmpeg ? TAVO_OK : tavo_probe(song.path.c_str(), nullptr);
+    return code == TAVO_ERR_FORMAT || code == TAVO_ERR_OPEN || code == TAVO_ERR_CODEC ||
+           code == TAVO_ERR_LOW_RATE;
+}
+
+failure decode_song(const std::string &path, const options &opts, int stop_fd, song_file &song) {
+    if (opts.ffmpeg.empty()) {
+        return {"ffmpeg, which may read it, is not installed or is switched off."};
+    }
+    int sound_fd = -1;
+    const ffmpeg_limits limits = {opts.ffmpeg, opts.max_minutes};
+    if (failure failed = decode_with_ffmpeg(limits, path, song.fd, stop_fd, sound_fd))
+        return failed;
+    close_song(song);
+    song = {"/proc/self/fd/" + std::to_string(sound_fd), sound_fd, true};
+    return {};
+}
+
+void close_song(song_file &song) {
+    if (song.fd >= 0) close(song.fd);
+    song.fd = -1;
+}

@@ -1,0 +1,80 @@
+"""What the command does with the ffmpeg program: it decodes what the library refuses."""
+import pathlib
+import signal
+import subprocess
+
+from command_case import Case, song
+
+SONG = song(seconds=20, bpm=120, loud_at=8)
+
+ENCODED = {  # name: options of ffmpeg
+    "24.wav": "-c:a pcm_s24le", "float.wav": "-c:a pcm_f32le", "96k.wav": "-ar 96000", "4k.wav": "-ar 4000",
+    "a.aiff": "", "alac.m4a": "-c:a alac", "a.opus": "", "a.webm": "-c:a libopus", "a.wma": "",
+    "-b:c.mkv": "-c:a flac",
+    "late.mkv": "-f lavfi -i testsrc=size=64x64:rate=10:duration=20 -itsoffset 0.5 -i SONG -map 1 -map 2"}
+FAILING = {  # an ffmpeg of ours: what is said about it
+    "kill -9 $$": "ffmpeg was ended by signal 9", "echo '[x @ 0x1] bad box.' >&2; echo y >&2; exit 1": "ffmpeg: bad box.",
+    "head -c 300000 a.wav; exit 3": "ffmpeg ended with status 3.", "exit 0": "decodes nothing", "exec sleep 60": ""}
+NAMING_OTHERS = {"a.m3u8": b"#EXTM3U\n#EXT-X-TARGETDURATION:60\n#EXTINF:60,\na.ts\n#EXT-X-ENDLIST\n",
+                 "a.ffconcat": b"ffconcat version 1.0\nfile a.ts\n", "a.mkv": b"ffconcat version 1.0\nfile a.ts\n"}
+
+
+def children(pid):
+    return pathlib.Path(f"/proc/{pid}/task/{pid}/children").read_text().split()
+
+
+class Ffmpeg(Case):
+    def encode(self, name, words):
+        subprocess.run(["ffmpeg", "-nostdin", "-v", "error", "-i", SONG, *words.replace("SONG", str(SONG)).split(),
+                        "file:" + name], cwd=self.folder, check=True)
+        return self.folder / name
+
+    def fake(self, script):
+        program = self.put("bin/ffmpeg", b"#!/bin/sh\n" + script.encode() + b"\n")
+        program.chmod(0o755)
+        return {"env": {"PATH": f"{program.parent}:/usr/bin:/bin"}}
+
+    def test_decodes_what_the_library_refuses(self):
+        for name, words in ENCODED.items():
+            self.encode(name, words)
+        self.put("notes.txt", b"This is a letter, not a song.\n" * 99)
+        results = self.run_json("--mode", "highlight", "-j", "2", ".")
+        self.assertEqual({r["file"][2:] for r in results}, set(ENCODED))
+        for result in results:
+            late = 500 if "late" in result["file"] else 0
+            self.assertEqual(result["decoder"], "ffmpeg", result)
+            self.assertAlmostEqual(result["duration_ms"], 20000 + late, delta=100, msg=result)
+            self.assertAlmostEqual(result["hl_pos_ms"], 8000 + late, delta=400, msg=result)
+        self.run_tavo("24.wav", status=1, said=b"ffmpeg, which may read it, is not installed", env={"PATH": "bin"})
+
+    def test_what_comes_through_a_pipe_is_like_a_file(self):
+        for path in (SONG, self.encode("a.m4a", ""), self.encode("a.opus", "")):
+            (piped,) = self.run_json("/dev/stdin", input=path.read_bytes())
+            self.assertEqual(piped, {**self.run_json(path)[0], "file": "/dev/stdin"})
+        self.run_tavo("/dev/stdin", input=b"RIFF", status=1, said=b"Only 4 bytes")
+
+    def test_reads_no_other_file(self):
+        self.encode("a.ts", "")
+        self.assertEqual(self.run_json("a.ts")[0]["decoder"], "ffmpeg")
+        for name, content in NAMING_OTHERS.items():
+            self.put(name, content)
+            self.run_tavo(name, status=1, said=b"Format not on whitelist")
+
+    def test_a_failing_ffmpeg_fails_its_file_alone(self):
+        self.put("a.wav")
+        self.put("b.mkv", b"no song at all" * 9)
+        for script, said in FAILING.items():
+            fake = self.fake(script)
+            if not said:
+                break
+            results = self.run_json("b.mkv", "a.wav", status=1, **fake)
+            self.assertEqual([r["status"] for r in results], ["failed", "ok"])
+            self.assertIn(said, results[0]["error"])
+        idle = self.start("b.mkv", **fake)
+        stopped = self.start("-f", "json", "b.mkv", **fake)
+        (worker,) = self.wait_until(lambda: children(stopped.pid))
+        (child,) = self.wait_until(lambda: children(worker))
+        stopped.send_signal(signal.SIGINT)
+        self.assertEqual(stopped.wait(10), 130)
+        self.assertFalse(pathlib.Path("/proc", child).exists())
+        self.assertIn(b"ffmpeg made no progress for 30 s", idle.communicate(timeout=60)[1])
