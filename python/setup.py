@@ -19,8 +19,8 @@ class BuildWithLibrary(build_py):
         package = pathlib.Path(self.build_lib, "tavo")
         with tempfile.TemporaryDirectory() as folder:
             build, prefix = f"{folder}/build", pathlib.Path(folder, "prefix")
-            options = ["-DCMAKE_BUILD_TYPE=Release", "-DCMAKE_INSTALL_LIBDIR=lib", "-DTAVO_BUILD_TESTS=OFF",
-                       "-DTAVO_BUILD_JNI=OFF", "-DTAVO_BUILD_JAVA=OFF"]
+            options = ["-DCMAKE_BUILD_TYPE=Release", "-DCMAKE_CXX_FLAGS_RELEASE=-O2", "-DCMAKE_INSTALL_LIBDIR=lib",
+                       "-DTAVO_BUILD_TESTS=OFF", "-DTAVO_BUILD_JNI=OFF", "-DTAVO_BUILD_JAVA=OFF"]
             subprocess.run(["cmake", "-S", SOURCE, "-B", build, *options], check=True)
             subprocess.run(["cmake", "--build", build, "--parallel", str(os.cpu_count() or 1)], check=True)
             subprocess.run(["cmake", "--install", build, "--prefix", prefix, "--strip"], check=True)

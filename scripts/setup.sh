@@ -20,7 +20,7 @@ tests=(
 cluster=(slurm-wlm munge postgresql postgresql-client) # scripts/test-cluster.sh
 fuzz=(clang libclang-rt-14-dev)
 measure=(clang libclang-rt-14-dev gcovr valgrind)
-package=(dpkg-dev debhelper lintian debootstrap) # scripts/test-package.sh, scripts/test-fresh.sh
+package=(dpkg-dev debhelper dh-python doxygen lintian debootstrap) # scripts/test-package.sh, scripts/test-fresh.sh
 
 wanted=()
 for group in "${@:-build java tests fuzz}"; do

@@ -1,8 +1,9 @@
 #!/usr/bin/env bash
 # scripts/test-package.sh
-# Before a release, as root, a few minutes: makes the packages; in a clean Debian 12 of its own,
-# installs the .deb with apt, uses the command, builds a program against it, removes it again; then
-# uses the .tar.gz there.
+# Before a release, as root, a quarter of an hour: makes the Debian packages twice, in two folders, and
+# compares their bytes; runs lintian; installs them with apt in a clean Debian 12 of its own, uses the
+# command, the Python package and the jar, builds a program, removes them again; then uses the .tar.gz
+# there. A wheel is built and used in a virtual environment.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $(id -u) -ne 0 ]]; then
@@ -12,13 +13,23 @@ fi
 bash scripts/setup.sh build java tests package
 
 build=$PWD/build/package
-rm -rf "$build/packages"
-cmake --preset release -B "$build" -DTAVO_BUILD_TESTS=OFF >/dev/null
-cmake --build "$build"
-cpack --config "$build/CPackConfig.cmake"
-deb=("$build"/packages/*.deb)
+rm -rf "$build"
+debs=$build/first
+for copy in first second; do # of the last commit
+  mkdir -p "$build/$copy/tavo"
+  git archive HEAD | tar -x -C "$build/$copy/tavo"
+  (cd "$build/$copy/tavo" && dpkg-buildpackage -b -us -uc >"$build/$copy.log" 2>&1) ||
+    { tail -n 40 "$build/$copy.log" >&2; exit 1; }
+done
+for deb in "$debs"/*.deb; do
+  cmp "$deb" "$build/second/${deb##*/}"
+done
+(cd "$debs" && sha256sum ./*.deb)
+lintian --allow-root --fail-on error,warning "$debs"/*.changes
+
+tree=$debs/tavo/build/debian
+cpack -G TGZ --config "$tree/CPackConfig.cmake" -B "$build/packages" >/dev/null
 tar=("$build"/packages/*.tar.gz)
-dpkg-deb --field "${deb[0]}" Package Version Depends
 
 root=$(mktemp -d)
 log=$(mktemp)
@@ -43,12 +54,14 @@ traces() { # what a removal must take away
 }
 
 mkdir "$root/try"
-cp "${deb[0]}" "$root/try/tavo.deb"
+mkdir "$root/try/debs"
+cp "$debs"/*.deb "$root/try/debs"
+rm "$root"/try/debs/*-dbgsym_*
 cp "${tar[0]}" "$root/try/tavo.tar.gz"
 # Two hits a second, loud from 15 s on.
 ffmpeg -v error -f lavfi -i \
   'aevalsrc=sin(2*PI*220*t)*(0.1+0.6*gt(t\,15))*exp(-8*mod(t\,0.5)):d=40:s=44100' "$root/try/song.flac"
-expected=$(cd "$root/try" && "$build/bin/tavo" --format json --length 20 song.flac)
+expected=$(cd "$root/try" && "$tree/bin/tavo" --format json --length 20 song.flac)
 [[ $expected == *'"status":"ok"'* ]] || fail "the build gives $expected"
 same() { # same COMMAND: its result is the build's
   local got
@@ -57,10 +70,15 @@ same() { # same COMMAND: its result is the build's
   echo "$1: the build's result"
 }
 
-echo "== the .deb"
+echo "== the Debian packages"
 quietly inside apt-get update
-quietly inside apt-get install -y --no-install-recommends /try/tavo.deb
+quietly inside apt-get install -y --no-install-recommends python3-numpy default-jre-headless
+quietly inside sh -c 'apt-get install -y --no-install-recommends /try/debs/*.deb'
 same tavo
+same "python3 -m tavo"
+inside python3 -c "import tavo; print(tavo.__version__, tavo.analyze('/try/song.flac', length=20).highlight_ms)"
+inside java -Djava.library.path="/usr/lib/$(dpkg-architecture -qDEB_HOST_MULTIARCH)" -jar /usr/share/java/tavo.jar \
+  --length 20 /try/song.flac
 for file in /usr/share/man/man1/tavo.1 /usr/share/bash-completion/completions/tavo; do
   [[ -s $root$file ]] || fail "$file is missing"
 done
@@ -70,7 +88,7 @@ cache=$(inside ldconfig -p)
 
 quietly inside apt-get install -y --no-install-recommends gcc libc6-dev pkg-config
 # shellcheck disable=SC2016 # for the shell inside
-inside sh -c 'cc /usr/share/doc/tavo/examples/analyze_file.c -o /try/analyze_file \
+inside sh -c 'cc /usr/share/doc/tavo-doc/examples/analyze_file.c -o /try/analyze_file \
   $(pkg-config --cflags --libs tavo) -pthread'
 lines=$(inside /try/analyze_file /try/song.flac 20)
 highlight=${expected#*'"hl_pos_ms":'}
@@ -79,7 +97,7 @@ highlight=${highlight%%,*}
 echo "analyze_file: highlight $highlight, $(grep -c '^beat ' <<<"$lines") beats"
 
 [[ -n $(traces) ]] || fail "a removal would not be seen"
-quietly inside apt-get purge -y tavo
+quietly inside apt-get purge -y libtavo1 tavo-doc
 left=$(traces)
 [[ -z $left ]] || fail "left behind: $left"
 echo "purged: nothing left"
@@ -88,4 +106,13 @@ echo "== the .tar.gz"
 inside mkdir /try/anywhere
 inside tar -xzf /try/tavo.tar.gz -C /try/anywhere --strip-components 1
 same /try/anywhere/bin/tavo
+echo "== the wheel"
+python=/usr/bin/python3
+"$python" -m pip wheel --quiet --no-index --no-build-isolation --no-deps --wheel-dir "$build/wheel" ./python
+"$python" -m venv --system-site-packages "$build/venv" # NumPy is Debian's
+"$build/venv/bin/pip" install --quiet --no-index "$build"/wheel/tavo-*-py3-none-linux_*.whl
+got=$(cd "$root/try" && "$build/venv/bin/tavo" --format json --length 20 song.flac)
+[[ $got == "$expected" ]] || fail "the wheel gives $got instead of $expected"
+(cd / && "$build/venv/bin/python" -c 'import sys, tavo; print(tavo.__file__, tavo.analyze(sys.argv[1]).highlight_ms)' \
+  "$root/try/song.flac")
 echo "test-package: all well"
