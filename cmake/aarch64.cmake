@@ -1,4 +1,4 @@
-# Debian's cross compiler, with the libraries that scripts/aarch64-sysroot.sh laid out, under qemu.
+# Debian's cross compiler, with the libraries that scripts/aarch64-sysroot.sh unpacks, and qemu.
 set(CMAKE_SYSTEM_NAME Linux)
 set(CMAKE_SYSTEM_PROCESSOR aarch64)
 set(CMAKE_C_COMPILER aarch64-linux-gnu-gcc)

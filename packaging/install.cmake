@@ -1,13 +1,13 @@
-# cmake --install. The public header goes to include/tavo, which both packages name as the include
-# folder: <tavo.h>. Whatever is installed finds the rest relative to itself.
+# cmake --install. The public header goes to include/tavo, the include folder that the CMake package and
+# tavo.pc name. All files find each other by relative paths.
 set(headers_dir ${CMAKE_INSTALL_INCLUDEDIR}/tavo)
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/tavo)
 install(FILES include/tavo.h DESTINATION ${headers_dir})
 install(TARGETS tavo EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}
   INCLUDES DESTINATION ${headers_dir})
 
-# A device brings these two. Here they are the library's own: their names are too common for a folder
-# that every program searches, and android-liblog has a liblog of another make.
+# A device has these two. On a desktop they are private: their names are too common for a folder that every
+# program searches, and Debian's android-liblog has another liblog.
 if(NOT ANDROID)
   install(TARGETS log wexaaudio EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)
   install(TARGETS wexaaudio_av DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)  # wexaaudio loads it

@@ -1,7 +1,7 @@
 #!/bin/sh
-# aarch64-sysroot.sh: lays out Debian's arm64 libraries in build/aarch64-sysroot, for the cross
-# compiler and for qemu, and the two headers of Android's that the library includes. Nothing of this
-# system changes: no foreign architecture, no package. Does nothing when the sysroot is there.
+# aarch64-sysroot.sh: unpacks Debian's arm64 libraries into build/aarch64-sysroot, for the cross
+# compiler and for qemu, and the two Android headers that the library includes. Adds no architecture
+# and no package to this system. Does nothing if the sysroot exists.
 set -eu
 cd "$(dirname "$0")/.."
 root=$PWD/build/aarch64-sysroot

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # scripts/setup.sh [build|java|tests|cluster|fuzz|measure|package]...
 # Installs the Debian packages that are missing: build, java, tests and fuzz by default; build alone
-# is enough for the library and the command. Says nothing when none is missing.
+# is enough for the library and the command. Prints nothing if none is missing.
 set -euo pipefail
 
 build=(

@@ -1,7 +1,6 @@
 #!/bin/sh
-# test-aarch64.sh [SONG...]: builds for AArch64 and runs the tests there, under qemu; among them the
-# golden results. SONGs, in any format that ffmpeg reads, are compared with this machine's results as
-# well.
+# test-aarch64.sh [SONG...]: builds for AArch64 and runs the tests under qemu, among them the golden
+# results. Also compares the results of the SONGs, in any format that ffmpeg reads, with this machine's.
 set -eu
 for song in "$@"; do
   set -- "$@" "$(realpath "$song")"
@@ -21,7 +20,7 @@ if [ -n "$missing" ]; then
 fi
 scripts/aarch64-sysroot.sh
 
-# This machine's songs, which the tests there take.
+# The tests use the songs that this machine encodes.
 cmake --preset release
 cmake --build --preset release --target song_results make_song
 ctest --preset release -R '^songs$'

@@ -1,8 +1,8 @@
 #!/usr/bin/env bash
 # scripts/test-fresh.sh [COMMAND]...
 # Before a release, as root, an hour or more: makes a bare Debian 12 root, clones the last commit into
-# it under /root and runs what the README tells a newcomer to run, or the COMMANDs instead. Mounts
-# nothing of this machine: /proc is a new one, /dev holds a few new device nodes.
+# it under /root and runs the README's first commands, or the COMMANDs instead. Mounts nothing of this
+# machine: /proc is mounted anew, /dev contains a few new device nodes.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $(id -u) -ne 0 ]]; then

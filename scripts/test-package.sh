@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # scripts/test-package.sh
-# Before a release, as root, a quarter of an hour: makes the Debian packages twice, in two folders, and
-# compares their bytes; runs lintian; installs them with apt in a clean Debian 12 of its own, uses the
-# command, the Python package and the jar, builds a program, removes them again; then uses the .tar.gz
-# there. A wheel is built and used in a virtual environment.
+# Before a release, as root, a quarter of an hour. Builds the Debian packages twice, in two folders, and
+# compares their bytes; runs lintian; installs them with apt in a clean Debian 12, runs the command, the
+# Python package and the jar, builds a program, removes the packages; runs the command of the .tar.gz.
+# Builds a wheel and installs it in a virtual environment.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $(id -u) -ne 0 ]]; then
@@ -40,7 +40,7 @@ quietly() {
 }
 echo "== a clean system"
 quietly debootstrap --variant=minbase bookworm "$root"
-mount -t proc proc "$root/proc" # the loader learns there where a program lies
+mount -t proc proc "$root/proc" # where the loader finds the path of a program
 inside() {
   env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin LC_ALL=C.UTF-8 DEBIAN_FRONTEND=noninteractive \
     chroot "$root" "$@"
@@ -49,7 +49,7 @@ fail() {
   echo "test-package: $*" >&2
   exit 1
 }
-traces() { # what a removal must take away
+traces() { # files that a removal must delete
   inside find / -xdev -path /proc -prune -o -name '*tavo*' ! -path '/try/*' -print
 }
 

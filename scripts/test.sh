@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
 # scripts/test.sh
-# Sets up, checks the formatting and what .clang-tidy asks for, builds and runs every test, among them
-# the fuzzers' kept inputs, in the release and under the sanitizers. Ends with CTest's summary; fails when any of it does.
+# Installs what is missing, checks the formatting, builds, runs clang-tidy and every test, among them the
+# fuzzers' kept inputs, in the release and under the sanitizers. Ends with CTest's summary; fails if any
+# step fails.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 

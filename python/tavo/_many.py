@@ -23,12 +23,12 @@ def analyze_many(
     jobs: Optional[int] = None,
     progress: Optional[Callable[[int, int], None]] = None,
 ) -> Iterator[Union[Result, TavoError]]:
-    """Analyses songs at the same time and yields what comes of each, in the order of the paths.
+    """Analyses several songs at a time and yields their results in the order of the paths.
 
-    A song that cannot be analysed is yielded as a TavoError, so that the others go on.
-    jobs: songs at once, each in a process of its own; None for one per processor.
+    A song that cannot be analysed is yielded as a TavoError; the others continue.
+    jobs: number of worker processes, one song each; None for one per processor.
     progress: called after each song with the number done and the number of paths.
-    mode, length, max_beats: as for analyze. A path that is a folder stands for the songs in it.
+    mode, length, max_beats: as for analyze. A folder among the paths means the songs in it.
     """
     check(mode, length, max_beats)
     names = [os.fsencode(path) for path in paths]

@@ -1,4 +1,4 @@
-"""cmake --install into a folder, and programs built against what lies there, by both packages."""
+"""Installs into a folder and builds programs against it, by the CMake package and by pkg-config."""
 import array
 import json
 import os
@@ -24,7 +24,7 @@ class Installed(unittest.TestCase):
     @classmethod
     def setUpClass(cls):
         cls.folder = pathlib.Path(cls.enterClassContext(tempfile.TemporaryDirectory()))
-        # Installed, then moved: nothing may depend on where it was laid first.
+        # Installed, then moved: nothing may depend on the first folder.
         run(CMAKE, "--install", BUILD, "--prefix", cls.folder / "first place")
         cls.prefix = (cls.folder / "first place").rename(cls.folder / "prefix")
         cls.lib = cls.prefix / LIBDIR
@@ -41,7 +41,7 @@ class Installed(unittest.TestCase):
         return run("pkg-config", *arguments, "tavo", env=environment).split()
 
     def build_and_run(self, compiler, source, *options):
-        """What the program says of the song, run in an empty folder, which stays so: no click track."""
+        """Output of the program for the song. It runs in an empty folder, which stays empty: no click track."""
         program = source.with_suffix(".program")
         run(compiler, *options, *STRICT, source, *self.pkg_config("--cflags", "--libs"), "-o", program)
         with tempfile.TemporaryDirectory() as empty:
@@ -95,7 +95,7 @@ class Installed(unittest.TestCase):
         self.assertEqual(os.readlink(self.lib / "libtavo.so"), SONAME)
 
     def test_libraries(self):
-        """They are found beside each other, those with common names in a folder of their own."""
+        """Libraries find each other by relative paths; those with common names are in a folder of their own."""
         self.assertEqual({path.name.split(".")[0] for path in self.lib.glob("lib*")}, {"libtavo"})
         environment = {k: v for k, v in os.environ.items() if k != "LD_LIBRARY_PATH"}
         found = dict(re.findall(r"(\S+) => (\S.*) \(", run("ldd", self.tavo, env=environment)))

@@ -95,7 +95,7 @@ public final class Analyze {
         return allDone;
     }
 
-    /** What came of one file; {@code error} is null for a result. */
+    /** The outcome of one file; {@code error} is null for a result. */
     private static final class Outcome implements TavoListener {
         final CountDownLatch done = new CountDownLatch(1);
         String error;
