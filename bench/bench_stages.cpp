@@ -157,7 +157,7 @@ void placement(benchmark::State &state) {
     analysis a;
     open_analysis(&a);
     _getOnsetEnvelope(&a.beat, kFrameSize, kHopSize);
-    // More room than any placement of this song can need: every frame, and the added beats.
+    // More than any result: every frame, and the added beats.
     std::vector<float> beats(static_cast<size_t>(a.beat.frame_count) + 50);
     for (auto _ : state) {
         benchmark::DoNotOptimize(getBeatCandi_MT(&a.beat, &a.onset, beats.data()));

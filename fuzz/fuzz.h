@@ -1,5 +1,5 @@
-// What the fuzzers share. Each brings bytes into the reach of what a caller guarantees and aborts
-// at a broken promise. Choices come from an input's end, so that an audio file can be an input.
+// Shared by the fuzzers. Each turns bytes into arguments that a caller may pass and aborts if a
+// promise is broken. Choices come from an input's end, so that an audio file can be an input.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 
@@ -61,7 +61,7 @@ inline void fill(int fd, const std::vector<uint8_t> &bytes) {
          "a file is written");
 }
 
-// A file of these bytes; its path. The one before is gone.
+// Path of a file of these bytes, which replaces the one before.
 inline std::string file_of(const std::vector<uint8_t> &bytes) {
     static const int fd = memfd_create("input", MFD_CLOEXEC);
     fill(fd, bytes);

@@ -1,5 +1,5 @@
-// Recognition of a file's format. With zeros in the middle the scan's limits, 32 KiB away, come
-// into a short input's reach.
+// Recognition of a file's format. Zeros in the middle let a short input reach the scan's limits of
+// 32 KiB.
 #include "fuzz/fuzz.h"
 #include "media_source/mtsrc.h"
 
@@ -11,7 +11,7 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     fuzz::input in(data, size);
     const bool far = in.ConsumeIntegralInRange(0, 31) == 31;  // a hundred times slower
     const auto gap = far ? in.ConsumeIntegralInRange<size_t>(32'000, 32'764) : 0;
-    const int64_t start = in.ConsumeBool() ? 3 : 0;  // recognition begins where the file stands
+    const int64_t start = in.ConsumeBool() ? 3 : 0;  // recognition starts at the file's offset
     auto bytes = in.ConsumeRemainingBytes<uint8_t>();
     bytes.insert(bytes.begin() + static_cast<ptrdiff_t>(bytes.size() / 2), gap, 0);
     std::string path = fuzz::file_of(bytes);

@@ -1,5 +1,5 @@
-// replay RUNS DIR...: gives a fuzzer's function every file in DIRs, then RUNS inputs made of them,
-// the same ones each time. That of a failure is left beside the program, in a file named .last.
+// replay RUNS DIR...: passes every file in the DIRs to the fuzzer's function, then RUNS inputs made
+// from them, the same each time. The input of a failure is left in the program's path with .last.
 #include <fcntl.h>
 
 #include <ctime>
@@ -35,7 +35,8 @@ void run(int last, const bytes &input) {
     fuzz::fill(last, input);
     const clock_t start = clock();
     LLVMFuzzerTestOneInput(input.data(), input.size());
-    fuzz::must(clock() - start <= RUN_SECONDS * CLOCKS_PER_SEC, "a run takes no longer than it may");
+    fuzz::must(clock() - start <= RUN_SECONDS * CLOCKS_PER_SEC,
+               "a run takes no longer than it may");
 }
 
 }  // namespace

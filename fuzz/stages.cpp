@@ -1,5 +1,5 @@
-// The stages of the analysis: each against its plain form, or against what its result must be like.
-// Threads cannot be started here: bodies of workers run on the calling thread.
+// The stages of the analysis: properties of their results, and plain forms of two of them. Threads
+// cannot be started here: workers run on the calling thread.
 #include <pthread.h>
 
 #include <cerrno>
@@ -29,7 +29,7 @@ using fuzz::must;
 
 constexpr size_t kMostPoints = 400;
 
-std::vector<int16_t> take_pcm(fuzz::input *in, size_t most) {
+std::vector<int16_t> read_pcm(fuzz::input *in, size_t most) {
     std::vector<int16_t> pcm(std::min(in->remaining_bytes() / 2, most));
     if (!pcm.empty()) in->ConsumeData(pcm.data(), 2 * pcm.size());
     return pcm;
@@ -37,7 +37,7 @@ std::vector<int16_t> take_pcm(fuzz::input *in, size_t most) {
 
 // --- 3: conversion
 
-int32_t take_rate(fuzz::input *in) {
+int32_t choose_rate(fuzz::input *in) {
     return in->ConsumeBool() ? in->ConsumeIntegralInRange(1, 192'000)
                              : in->PickValueInArray({8000, 11025, 12000, 16000, 22050, 24000, 32000,
                                                      33075, 44100, 44099, 48000, 88200, 96000});
@@ -78,23 +78,23 @@ int64_t convert_plainly(const dorn_resampler_state &s, const std::vector<int16_t
 // means of blocks, and cleared bytes.
 void convert(fuzz::input *in) {
     const auto state = std::make_unique<dorn_resampler_state>();
-    const int32_t target = in->ConsumeBool() ? kAnalysisRate : take_rate(in);
+    const int32_t target = in->ConsumeBool() ? kAnalysisRate : choose_rate(in);
     const bool whole = in->ConsumeBool();
-    const int32_t source = whole ? target * in->ConsumeIntegralInRange(1, 8) : take_rate(in);
+    const int32_t source = whole ? target * in->ConsumeIntegralInRange(1, 8) : choose_rate(in);
     const int32_t channels = in->ConsumeIntegralInRange(1, 3);
     const bool odd = in->ConsumeBool();  // one byte more
-    const std::vector<int16_t> pcm = take_pcm(in, 2000);
+    const std::vector<int16_t> pcm = read_pcm(in, 2000);
     const auto count = static_cast<int64_t>(pcm.size());
     if (pcm.empty() || count * target / source > 8000) return;
     must(dorn_resampler_prepare(state.get(), source, target, channels) == 0, "rates are prepared");
     std::vector<int16_t> samples;
     const int64_t code = convert_plainly(*state, pcm, &samples);
     std::vector<int16_t> out(std::max<size_t>(samples.size(), 1));
-    std::vector<int16_t> loud(pcm.size() + 200, INT16_MAX);  // what surrounds is not heard
+    std::vector<int16_t> loud(pcm.size() + 200, INT16_MAX);  // samples outside must not count
     std::copy(pcm.begin(), pcm.end(), loud.begin() + 100);
     must(dorn_resampler_convert(state.get(), &loud[100], static_cast<int32_t>(count), out.data()) ==
              code,
-         "a conversion ends where it does");
+         "a conversion has its length or its error");
     must(std::equal(samples.begin(), samples.end(), out.begin()), "a conversion is its sums");
     if (channels > 1) return;
 
@@ -119,7 +119,7 @@ void convert(fuzz::input *in) {
 // --- 7: the highlight
 
 // count positions below n, ascending, of a list of at least room entries.
-std::vector<int32_t> take_positions(fuzz::input *in, size_t count, size_t room, int32_t n) {
+std::vector<int32_t> choose_positions(fuzz::input *in, size_t count, size_t room, int32_t n) {
     std::vector<int32_t> list(count);
     for (int32_t &at : list) at = in->ConsumeIntegralInRange(0, n - 1);
     std::sort(list.begin(), list.end());
@@ -134,8 +134,8 @@ void select_region(fuzz::input *in) {
                                              : in->ConsumeIntegralInRange(0, INT32_MAX / 2);
     const int32_t n = in->ConsumeIntegralInRange(1, static_cast<int32_t>(kMostPoints));
     const int32_t chosen = in->ConsumeIntegralInRange(-1, n);
-    const auto valleys = take_positions(in, static_cast<size_t>(nv), 15, n);
-    const auto pairs = take_positions(in, static_cast<size_t>(2 * nseg), 0, n);
+    const auto valleys = choose_positions(in, static_cast<size_t>(nv), 15, n);
+    const auto pairs = choose_positions(in, static_cast<size_t>(2 * nseg), 0, n);
     const auto mean = in->ConsumeProbability<float>();
     const auto deviation = in->ConsumeProbability<float>();
     const auto curve = fuzz::exactly<float>(in, static_cast<size_t>(n));
@@ -166,7 +166,7 @@ void search_curve(fuzz::input *in) {
 
 // --- 4 to 6: beats
 
-// From an envelope on: tempo, threshold, candidates, gaps. Values repeat.
+// Tempo, threshold, candidates and gaps of an envelope whose values repeat.
 void place_beats(fuzz::input *in) {
     const int32_t limit = in->ConsumeIntegralInRange(-2, 40);
     const int32_t free_tempo = in->ConsumeBool() ? in->ConsumeIntegralInRange(30, 200) : 0;
@@ -209,7 +209,7 @@ void place_beats(fuzz::input *in) {
     must(std::is_sorted(out.begin(), out.begin() + count), "beats ascend");
     const float last = 1000.0f * beat->frame_times[0] * static_cast<float>(frames + 1);
     must(count == 0 || (out[0] > 0.0f && out[static_cast<size_t>(count) - 1] <= last),
-         "beats lie in the song");
+         "beats are in the song");
     const auto four_beats = static_cast<float>(static_cast<int>(4.0 * 60.0 / onset.bpm));
     auto window = static_cast<size_t>(four_beats / beat->frame_times[0]);
     window += window % 2;

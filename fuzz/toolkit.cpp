@@ -1,4 +1,4 @@
-// The toolkit: each routine against a form written from its definition.
+// The toolkit: each routine against its definition.
 #include <complex>
 
 #include "dsp/dft.h"
@@ -31,7 +31,7 @@ std::complex<double> sum_at(const signal &x, int count, int k, int sign) {
     return sign < 0 ? sum : sum / static_cast<double>(n);
 }
 
-// Whether the first outputs values of y are the sums of the first inputs values of x.
+// Checks that the first outputs values of y are the sums of the first inputs values of x.
 void check_sums(const signal &y, int outputs, const signal &x, int inputs, int sign) {
     double norm = 0.0;
     for (size_t i = 0; i < x.re.size(); ++i) norm += std::fabs(x.re[i]) + std::fabs(x.im[i]);
@@ -59,7 +59,7 @@ void transform(fuzz::input *in) {
         memset(&fft, 0xAA, sizeof fft);
         tavo_fft_init(static_cast<int16_t>(n), &fft);
         must(tavo_fft_proc(y.re.data(), y.im.data(), static_cast<int16_t>(n), &fft) == y.re.data(),
-             "the transform's place is returned");
+             "the input array is returned");
         tavo_fft_deinit(&fft);
         tavo_fft_deinit(&fft);
     } else {
@@ -72,7 +72,7 @@ void transform(fuzz::input *in) {
     check_sums(y, count, x, n, 1);
     for (auto i = static_cast<size_t>(count); i < size; ++i) {
         must(memcmp(&y.re[i], &given.re[i], 8) == 0 && memcmp(&y.im[i], &given.im[i], 8) == 0,
-             "outputs that were not asked for stay");
+             "outputs from m on stay");
     }
 }
 
@@ -106,12 +106,12 @@ void check_peaks(const std::vector<T> &x, const std::vector<Index> &out, std::ve
     must(std::equal(out.begin(), out.end(), kept.begin(), kept.end()), "the peaks are found");
 }
 
-uint32_t take_distance(fuzz::input *in) {
+uint32_t choose_distance(fuzz::input *in) {
     return in->ConsumeBool() ? in->ConsumeIntegral<uint8_t>() : in->ConsumeIntegral<uint32_t>();
 }
 
 void sorted_peaks(fuzz::input *in) {
-    const uint32_t distance = take_distance(in);
+    const uint32_t distance = choose_distance(in);
     const uint32_t most = in->ConsumeBool() ? in->ConsumeIntegral<uint8_t>() : 0;
     const auto x = fuzz::values<float>(in, kMostValues);
     const size_t room = most == 0 ? SIZE_MAX : most;
@@ -122,7 +122,7 @@ void sorted_peaks(fuzz::input *in) {
 }
 
 void spaced_peaks(fuzz::input *in) {
-    const uint32_t distance = take_distance(in);
+    const uint32_t distance = choose_distance(in);
     const auto x = fuzz::values<double>(in, kMostValues);
     std::vector<int32_t> out(x.size() / 2);
     out.resize(static_cast<size_t>(
@@ -134,7 +134,7 @@ void spaced_peaks(fuzz::input *in) {
 }
 
 void priority_peaks(fuzz::input *in) {
-    const auto distance = static_cast<int32_t>(take_distance(in) & INT32_MAX);
+    const auto distance = static_cast<int32_t>(choose_distance(in) & INT32_MAX);
     std::vector<int32_t> priority(in->ConsumeIntegralInRange<size_t>(0, 16));
     for (int32_t &position : priority) position = in->ConsumeIntegral<int16_t>();
     const auto x = fuzz::values<double>(in, kMostValues);

@@ -15,7 +15,7 @@ namespace {
 
 using namespace std::string_literals;
 
-int starts_until_stop = 0;  // thread starts, with the one at which a stop arrives
+int starts_until_stop = 0;  // thread starts until a stop arrives
 int32_t *stop_flag = nullptr;
 
 // Drums from 0 s on, each heard until the next, no two neighbours equally loud.
@@ -30,7 +30,7 @@ std::vector<double> drum_song(double bpm, double seconds) {
     return song;
 }
 
-// Runs an analysis with a click track and gives the file, empty when there is none.
+// Returns the click track file of an analysis, empty if there is no file.
 std::string analyse_to_file(analysis *of) {
     const support::temporary_file file("click");
     fnamedec = file.path.c_str();
@@ -49,8 +49,8 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 }  // namespace
 
-// Quiet noise, then loud: the onset between them is a beat although only one is asked for and much
-// sharper onsets follow it, out of silence.
+// Quiet noise, then loud: the onset between them is the one beat requested, although much sharper
+// onsets out of silence follow.
 TEST(Beats, APowerRiseForcesABeat) {
     std::mt19937 random(9);
     std::vector<double> song(90 * 11025);
@@ -65,8 +65,8 @@ TEST(Beats, APowerRiseForcesABeat) {
     EXPECT_NEAR(of.ctx.onset->beat_times[0], 50000.0, 100.0);
 }
 
-// Four threads take the envelope. A stop before it leaves the tempo alone, one that arrives with it
-// is seen after the tempo, and with the threshold's threads it is too late.
+// The envelope has four threads. A stop before them leaves the tempo as it was, one that arrives
+// with the first is seen after the tempo, and one with the threshold's threads is too late.
 TEST(Beats, StopIsSeenBeforeTheEnvelopeAndAfterTheTempo) {
     for (const auto &[start, tempo, beats] :
          {std::tuple{0, false, false}, {1, true, false}, {5, true, true}}) {
@@ -89,7 +89,7 @@ TEST(Beats, StopIsSeenBeforeTheEnvelopeAndAfterTheTempo) {
     fault::disarm();
 }
 
-// Every worker starts, in order, even if the signal has no range for it.
+// Every worker starts, in order, even if its range is empty.
 TEST(Beats, EightWorkersStartWhateverTheLength) {
     struct start {
         void *(*entry)(void *);

@@ -16,8 +16,8 @@ struct peak {
     double height;
 };
 
-// kept_out: peaks with a plateau behind them, which is no peak itself: with two values above it in
-// the window around it, a peak is the 97th percentile there, and not above.
+// kept_out: peaks followed by a plateau, which is not a peak. With two larger values in its window
+// a peak equals the 97th percentile and does not exceed it.
 struct envelope {
     int64_t length;
     int32_t bpm;
@@ -27,8 +27,8 @@ struct envelope {
     float frame_s = static_cast<float>(kHop);
 };
 
-// The frames of the peaks behind the beats: a beat lies two hops after its frame's start.
-frames place(const envelope &env) {
+// The frames of the beats' peaks: a beat is two hops after the start of its frame.
+frames beats_of(const envelope &env) {
     working_context work(env.length);
     TAVO_BEAT_CTX *beat = &work.beat;
     for (const peak &p : env.peaks) beat->onset_env[p.frame] = p.height;
@@ -56,42 +56,42 @@ frames place(const envelope &env) {
 }  // namespace
 
 // 120 BPM: beats at least 43 frames apart, the larger first. -1 and 0 mean no limit.
-TEST(Candidates, PeaksAndTheirLimit) {
-    EXPECT_EQ(place({1, 90, {}}), frames{});
-    EXPECT_EQ(place({500, 0, {{100, 5}}}), frames{});
+TEST(Candidates, LargerPeaksAreChosenUpToTheLimit) {
+    EXPECT_EQ(beats_of({1, 90, {}}), frames{});
+    EXPECT_EQ(beats_of({500, 0, {{100, 5}}}), frames{});
     envelope env = {1000, 120, {{100, 5}, {110, 4}, {143, 5}, {200, 6}, {242, 5}, {400, 5}}};
     for (const int32_t none : {0, -1}) {
         env.max_beats = none;
-        EXPECT_EQ(place(env), (frames{100, 143, 200, 400}));
+        EXPECT_EQ(beats_of(env), (frames{100, 143, 200, 400}));
     }
     env.max_beats = 1;
-    EXPECT_EQ(place(env), frames{200});
+    EXPECT_EQ(beats_of(env), frames{200});
     for (const double value : {double{NAN}, double{INFINITY}, 1.0}) {
         for (int64_t frame = 0; frame < 999; ++frame) env.peaks.push_back({frame, value});
-        EXPECT_EQ(place(env), frames{}) << value;
+        EXPECT_EQ(beats_of(env), frames{}) << value;
     }
 }
 
-// Frames of 0.45 s: no two of the peaks are too near, and the list of them is full. The percentile
-// of any four frames is the largest value.
-TEST(Candidates, PeaksInEveryOtherFrame) {
+// Frames of 0.45 s: no two peaks are too close, so the list is full. The percentile of any four
+// frames is the largest value.
+TEST(Candidates, APeakInEveryOtherFrameIsNeverAboveTheThreshold) {
     envelope env = {300, 96, {}};
     env.frame_s = 0.45f;
     for (int64_t frame = 1; frame < 299; frame += 2) env.peaks.push_back({frame, 5});
-    EXPECT_EQ(place(env), frames{});
+    EXPECT_EQ(beats_of(env), frames{});
 }
 
 // At 40 BPM the window has 258 frames. In a song of one less, the eighth largest value is the top
 // of the line to the end: at frame 200, 73 of 129 steps up to it.
-TEST(Candidates, AWindowThatNearlyFits) {
-    EXPECT_EQ(place({257, 40, {}, {{200, 5.6}}, {}, 0, 8}), frames{});
-    EXPECT_EQ(place({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
+TEST(Candidates, AWindowThatNearlyFitsIsCut) {
+    EXPECT_EQ(beats_of({257, 40, {}, {{200, 5.6}}, {}, 0, 8}), frames{});
+    EXPECT_EQ(beats_of({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
 }
 
 // 96 BPM: beats two periods apart, 1.25 s. From 95 BPM down at least 3 s: five periods, 3.158 s. A
 // gap is filled when longer than 3 s, 129.2 frames, or at 40 BPM 6 s, not three spans: 258.4
 // frames.
-TEST(Candidates, DistancesThatCount) {
+TEST(Candidates, LeastDistanceAndLongGapDependOnTheTempo) {
     const std::tuple<int32_t, int64_t, int64_t, size_t> cases[] = {
         {96, 52, 0, 1},    {96, 53, 0, 2},    {95, 134, 0, 1},   {95, 135, 0, 2},
         {120, 129, 50, 2}, {120, 130, 50, 3}, {40, 258, 129, 2}, {40, 259, 129, 3}};
@@ -99,29 +99,29 @@ TEST(Candidates, DistancesThatCount) {
         envelope env = {1200, bpm, {{300, 20}, {300 + distance, 21}}};
         if (middle > 0) env.kept_out = {{300 + middle, 2}};
         env.plateau = 15;
-        EXPECT_EQ(place(env).size(), beats) << bpm << " BPM, " << distance << " frames";
+        EXPECT_EQ(beats_of(env).size(), beats) << bpm << " BPM, " << distance << " frames";
     }
 }
 
-// Both rises take the peak at 300, to which 330 is too close; without them the stronger fills the
-// gap. The last peak serves no rise: an ordinary one takes the place that needs no threshold.
+// Both rises select the peak at 300, to which 330 is too close; without them the stronger fills the
+// gap. The last peak is never selected: an ordinary one then needs no threshold.
 TEST(Candidates, ARiseNeedsNoThreshold) {
     envelope env = {1000, 120, {{100, 20}, {400, 21}}, {{300, 2}, {330, 3}}};
-    EXPECT_EQ(place(env), (frames{100, 330, 400}));
+    EXPECT_EQ(beats_of(env), (frames{100, 330, 400}));
     env.rises = {290, 310};
-    EXPECT_EQ(place(env), (frames{100, 300, 300, 400}));
-    EXPECT_EQ(place({400, 120, {{300, 5}}, {{200, 9}}}), frames{300});
-    EXPECT_EQ(place({400, 120, {{300, 5}}, {{200, 9}}, {350}}), (frames{200, 300}));
+    EXPECT_EQ(beats_of(env), (frames{100, 300, 300, 400}));
+    EXPECT_EQ(beats_of({400, 120, {{300, 5}}, {{200, 9}}}), frames{300});
+    EXPECT_EQ(beats_of({400, 120, {{300, 5}}, {{200, 9}}, {350}}), (frames{200, 300}));
 }
 
-TEST(Candidates, GapsAreFilled) {
+TEST(Candidates, LongGapsGetTheirStrongestPeaks) {
     envelope env = {
         1000, 120, {{100, 20}, {800, 21}}, {{200, 1}, {300, 2}, {400, 3}, {500, 4}, {600, 5}}};
-    EXPECT_EQ(place(env), (frames{100, 200, 300, 400, 500, 600, 800}));
+    EXPECT_EQ(beats_of(env), (frames{100, 200, 300, 400, 500, 600, 800}));
     env.kept_out.push_back({700, 2.5});  // a sixth: the weakest stays out
-    EXPECT_EQ(place(env), (frames{100, 300, 400, 500, 600, 700, 800}));
+    EXPECT_EQ(beats_of(env), (frames{100, 300, 400, 500, 600, 700, 800}));
     env.max_beats = 1;  // no gap
-    EXPECT_EQ(place(env), frames{800});
+    EXPECT_EQ(beats_of(env), frames{800});
 }
 
 // Five fit each gap. Nine gaps have 45, not more than 45, so a tenth is filled and no eleventh.
@@ -134,13 +134,13 @@ TEST(Candidates, FiftyAreAddedAtMost) {
                 {100 + 320 * k + 48 * t, 1.0 + static_cast<double>(12 * t + k) / 99});
         }
     }
-    EXPECT_EQ(place(env).size(), 13u + 50u);
+    EXPECT_EQ(beats_of(env).size(), 13u + 50u);
     env.max_beats = 3;
-    EXPECT_EQ(place(env).size(), 3u + 10u);
+    EXPECT_EQ(beats_of(env).size(), 3u + 10u);
 }
 
 // Of 3, 9, 3 and 2, the two equal ones give the first of them twice.
-TEST(Candidates, EqualPeaksBetweenTwoBeats) {
+TEST(Candidates, EqualPeaksAppearTwice) {
     const double heights[] = {0, 1, 0, 3, 0, 9, 0, 3, 0, 2};
     const int32_t peaks[] = {1, 3, 5, 7, 9};
     int32_t dst[3];

@@ -30,13 +30,13 @@ int32_t tempo_of(std::vector<double> env, const std::vector<pulse_pair> &pairs =
 //     lag  13     20     27     39     40     41     42     59     60     61     81
 //          0.767  0.994  0.948  0.693  0.671  0.650  0.629  0.347  0.335  0.324  0.161
 // 2583.984375 frames a minute over the lag is the tempo: 129 BPM for 20, 95 for 27.
-TEST(Tempo, ScoresOfKnownCorrelations) {
+TEST(Tempo, HasTheBestScoreOfTwoAndThreePeriods) {
     const struct {
         std::vector<std::pair<size_t, double>> weights;  // of each lag
         int32_t bpm;
     } cases[] = {
         {{{13, 1}}, 198},
-        {{{12, 1}}, 90},            // 215 BPM is not believed
+        {{{12, 1}}, 90},            // 215 BPM is discarded
         {{{18, 1}, {26, 1}}, 143},  // 0.967 and 0.964: on either side of 120 BPM
         {{{18, 1}, {26, 1.01}}, 99},
         // 20 and its double have 0.994 + 0.5 x 0.671 = 1.330, or its double's neighbours 0.25 x
@@ -65,9 +65,9 @@ TEST(Tempo, ScoresOfKnownCorrelations) {
     }
 }
 
-// The last minute decides, in a song of more than two minutes the second one: frames 2583 to 5166
-// of 7750, 416 to 2999 of 3000. A pair that counts, 20 frames apart, outweighs the other.
-TEST(Tempo, OneMinuteDecides) {
+// The last minute, or the second one of a song of more than two minutes: frames 2583 to 5166
+// of 7750, 416 to 2999 of 3000. A pair in it, 20 frames apart, outweighs the other.
+TEST(Tempo, DependsOnOneMinuteOnly) {
     const std::tuple<size_t, size_t, int32_t> cases[] = {{7750, 2583, 129}, {7750, 2582, 95},
                                                          {7750, 5146, 129}, {7750, 5147, 95},
                                                          {3000, 416, 129},  {3000, 415, 95}};
@@ -79,7 +79,7 @@ TEST(Tempo, OneMinuteDecides) {
 
 // Pulses every p frames correlate at p and 2p nearly the same, so the prior decides: p up to about
 // 144 BPM, else 2p. No period, as in silence, is 90 BPM, and above every tempo to calc_bpm_acf.
-TEST(Tempo, ShortExcerpts) {
+TEST(Tempo, ShortExcerptsAndSilence) {
     for (const auto &[length, period, bpm] :
          {std::tuple{1290u, 20u, 129},  // half a minute
           {42u, 20u, 129},              // a second: more lags than the transform has values

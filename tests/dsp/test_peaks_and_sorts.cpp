@@ -1,5 +1,4 @@
-// Peaks, searches, sorts and statistics on lists known by hand; random ones go through
-// fuzz/toolkit.cpp.
+// Peaks, searches, sorts and statistics on known lists; fuzz/toolkit.cpp has the random ones.
 #include <gtest/gtest.h>
 #include <pthread.h>
 
@@ -24,7 +23,7 @@ int order(int (*compare)(const void *, const void *), Value a, Value b) {
 }  // namespace
 
 // Peaks at 3, 5, 7. 9 suppresses 8 within 3, exclusive, or within 2, inclusive; that leaves 7.
-TEST(Peaks, Suppressed) {
+TEST(Peaks, TheLargestSuppressTheirNeighbours) {
     const list x = {0, 0, 0, 9, 0, 8, 0, 7, 0};
     const std::vector<float> single(x.begin(), x.end());
     indexes out(4);
@@ -35,14 +34,14 @@ TEST(Peaks, Suppressed) {
     EXPECT_EQ(findsortedNPeaks(single.data(), 9, 2, 0, largest.data()), 2);
     EXPECT_EQ(largest, (std::vector<uint32_t>{3, 7, 0, 0}));
     EXPECT_EQ(findsortedNPeaks(nullptr, -5, 1, 0, nullptr), 0);
-    const int32_t priority[] = {5, 99};  // the second's nearest is the last peak: nothing
+    const int32_t priority[] = {5, 99};  // nearest to 99 is the last peak, which is never taken
     EXPECT_EQ(findPeaksPriority(x.data(), 9, 3, out.data(), priority, 2), 1);
     EXPECT_EQ(out, (indexes{5, 7, 0, 0}));
     EXPECT_EQ(findPeaksPriority(x.data(), 9, 0, nullptr, nullptr, 0), -1);
 }
 
-// A long recording's worth: striking in pairs would take the test's whole time limit.
-TEST(Peaks, AQuarterOfAMillionPeaks) {
+// Comparing every pair of peaks would exceed the time limit.
+TEST(Peaks, AQuarterOfAMillionTakeNoLongerThanASort) {
     list x(500001);
     for (size_t i = 1; i < x.size(); i += 2) x[i] = 1.0 + static_cast<double>(i * 7919 % 500000);
     indexes out(350000), priority(100000, 250000);
@@ -51,7 +50,7 @@ TEST(Peaks, AQuarterOfAMillionPeaks) {
     EXPECT_EQ(std::count(out.begin(), out.begin() + 100000, 249999), 100000);
 }
 
-TEST(Peaks, Searches) {
+TEST(Peaks, SearchesReturnTheNearestAndTheFirstEqual) {
     const indexes ascending = {10, 20, 30};
     const struct {
         int32_t target, n, expected;
@@ -81,18 +80,8 @@ TEST(Sort, ComparatorsNeverReportEquality) {
     EXPECT_EQ(order(compare_peak_f, PEAK_INFO_F{1.0f, 0}, PEAK_INFO_F{1.0f, 9}), 1);
 }
 
-TEST(Sort, RangesAndPivots) {
-    list a = {9, 5, 7, 6, 0};
-    EXPECT_EQ(partition(1, 3, a.data()), 1);
-    quickSort(1, 3, a.data());
-    quickSort(1, 0, a.data());
-    swap(&a[0], &a[4]);
-    swap(&a[1], &a[1]);
-    EXPECT_EQ(a, (list{0, 5, 6, 7, 9}));
-}
-
 // Equal, falling and rising values split off one element at a time.
-TEST(Sort, DepthStaysSmallOnTheWorstInput) {
+TEST(Sort, RecursionIsShallowOnTheWorstInput) {
     pthread_attr_t small;
     pthread_attr_init(&small);
     ASSERT_EQ(pthread_attr_setstacksize(&small, 128 * 1024), 0);
@@ -112,7 +101,7 @@ TEST(Sort, DepthStaysSmallOnTheWorstInput) {
     pthread_attr_destroy(&small);
 }
 
-// Above 2^24 a float no longer counts by ones, and near 5.6 million its step is 0.5.
+// Above 2^24 floats are even, and near 5.6 million they are multiples of 0.5.
 TEST(Stats, PopulationDeviationInBothPrecisions) {
     const double x[] = {2, 4, 4, 4, 5, 5, 7, 9};
     const float single[] = {2, 4, 4, 4, 5, 5, 7, 9}, large[] = {16777216, 1, 1};

@@ -1,5 +1,5 @@
-// The FFT, the direct transforms, the mel scale and the matrix product on values known by hand;
-// random ones go through fuzz/toolkit.cpp.
+// The FFT, the direct transforms, the mel scale and the matrix product on known values;
+// fuzz/toolkit.cpp has the random ones.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -20,7 +20,7 @@ constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
 }  // namespace
 
-TEST(Fft, TablesListEveryPairOnce) {
+TEST(Fft, BitReverseTableListsEverySwapOnce) {
     TAVO_FFT_CTX ctx;
     tavo_fft_init(8, &ctx);
     EXPECT_EQ(ctx.stages, 3);
@@ -36,7 +36,7 @@ TEST(Fft, TablesListEveryPairOnce) {
     EXPECT_TRUE(ctx.cos_table == nullptr && ctx.sin_table == nullptr && ctx.bit_reverse == nullptr);
 }
 
-TEST(Fft, RefusesSizesThatAreNoPowerOfTwo) {
+TEST(Fft, RefusesSizesOtherThanPowersOfTwo) {
     for (const int size : {-32768, -4, 0, 1, 3, 12, 32767}) {
         const auto n = static_cast<int16_t>(size);
         TAVO_FFT_CTX ctx;
@@ -53,9 +53,8 @@ TEST(Fft, RefusesSizesThatAreNoPowerOfTwo) {
     EXPECT_EQ(bit_reverse2(32, 5), 0u);
 }
 
-// The excerpt's sizes, too long for the fuzzer. What must not be read holds poison; of the inverse
-// the first 86 values are wanted.
-TEST(Dft, LongTransformsOfTwoPulses) {
+// The sizes of a tempo excerpt, too long for the fuzzer. NaN where nothing may be read.
+TEST(Dft, TransformsTwoPulsesAndBack) {
     constexpr size_t kSize = 4096;
     list re(2584), im(kSize, kNan);
     re[20] = 1.0;
@@ -73,14 +72,14 @@ TEST(Dft, LongTransformsOfTwoPulses) {
     EXPECT_EQ(re[86], kept[86]);
 }
 
-// cos(2 pi 3 k / 8) at k = 0, 1, 3, 4: an infinite value keeps its sign.
-TEST(Dft, AnInfiniteValue) {
+// cos(2 pi 3 k / 8) at k = 0, 1, 3, 4.
+TEST(Dft, InfinityKeepsItsSign) {
     list re = {0, 0, 0, kInf, 0, 0, 0, 0}, im(8);
     tavo_dft(re.data(), im.data(), 8, 4, 1);
     EXPECT_TRUE(re[0] == kInf && re[1] == -kInf && re[3] == kInf && re[4] == -kInf);
 }
 
-TEST(Dft, LengthsOutsideTheRange) {
+TEST(Dft, RefusesLengthsOutsideTheRange) {
     list re = {1, 2}, im = {3, 4};
     for (const int64_t n : {int64_t{0}, int64_t{-1}, INT64_MIN}) {
         EXPECT_EQ(tavo_dft(re.data(), im.data(), n, n, 0), 0);
@@ -92,7 +91,7 @@ TEST(Dft, LengthsOutsideTheRange) {
     EXPECT_TRUE(re == list({1, 2}) && im == list({3, 4}));
 }
 
-TEST(Mel, BothWays) {
+TEST(Mel, ConvertsBothWays) {
     const std::pair<float, float> cases[] = {
         {0.0f, 0.0f},          {500.0f, 7.499996f},   {999.9f, 14.998492f},  {1000.0f, 15.0f},
         {2000.0f, 25.077812f}, {5512.0f, 39.817379f}, {11025.0f, 49.896507f}};
@@ -100,15 +99,15 @@ TEST(Mel, BothWays) {
     const std::pair<float, float> back[] = {
         {7.5f, 500.00027f}, {15.0f, 1000.0f}, {20.0f, 1410.4342f}, {39.8174f, 5512.0093f}};
     for (const auto &[mel, hz] : back) EXPECT_FLOAT_EQ(Mel2Hz(mel), hz);
-    // The neighbouring float is what an unrounded logarithm or exponential would give.
+    // Without rounding the logarithm or the exponential these would be the neighbouring floats.
     EXPECT_EQ(Hz2Mel(2333.0f), 27.3169632f);
     EXPECT_EQ(Hz2Mel(2703.0f), 29.457243f);
     EXPECT_EQ(Mel2Hz(17.85f), 1216.55334f);
     EXPECT_EQ(Mel2Hz(Hz2Mel(5512.0f)), 5512.0005f);
 }
 
-// No row where the weight is zero; a zero term touches nothing, not even infinity.
-TEST(Matrix, ZeroFactors) {
+// A row whose weight is zero is not read; a zero factor skips its term, even against infinity.
+TEST(Matrix, SkipsZeroFactors) {
     const auto infinity = static_cast<float>(kInf);
     const float a0[] = {0.0f, 2.0f, infinity}, b1[] = {1.0f, infinity}, b2[] = {0.0f, 1.0f};
     const float *a[] = {a0}, *b[] = {nullptr, b1, b2};

@@ -1,5 +1,5 @@
-// Curves drawn by hand and PCM of constant levels, given as pairs of how many places have which
-// value. The largest of a curve's points (2 s each) is 1, so the normalised values are these.
+// Curves and PCM of constant levels, written as pairs of a count and a value. The largest point of
+// a curve (2 s each) is 1, so the values are already normalised.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -39,7 +39,7 @@ std::vector<float> runs(const std::string &pairs) {
     return power;
 }
 
-// PCM that alternates in sign, unit samples for each place, whose mean square (full range = 1) is
+// PCM that alternates in sign, unit samples for each point, whose mean square (full scale 1) is
 // about the value.
 std::vector<int16_t> levels(const std::string &pairs, int64_t unit) {
     std::vector<int16_t> pcm;
@@ -68,7 +68,7 @@ uint32_t search(const std::string &curve, int32_t duration_s, int32_t hl_param =
     return _get_HL_simple(&hl, duration_s);
 }
 
-// Of 50 points, those in dips lie at depth.
+// The valleys of 50 points, of which those in dips have the value depth.
 indexes valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f, float std = 0.125f) {
     std::vector<float> values(50, 1.0f);
     for (const int32_t at : dips) values[static_cast<size_t>(at)] = depth;
@@ -78,7 +78,7 @@ indexes valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f, floa
     return out;
 }
 
-// Steps of 0.4 s from the first frame on, 3 s before the start.
+// The tuned start of PCM in steps of 0.4 s from 3 s before the start on.
 uint32_t tuned(const std::string &steps, int32_t rate = kRate, uint32_t start_ms = 3000,
                uint32_t duration_s = 60) {
     std::vector<int16_t> pcm = levels(steps, rate * 2 / 5);
@@ -86,7 +86,7 @@ uint32_t tuned(const std::string &steps, int32_t rate = kRate, uint32_t start_ms
     return _tune_HL_simple(pcm.data(), rate, start_ms, duration_s);
 }
 
-// The start that PCM of exactly its size gives, twice: the curve is replaced.
+// The start of a song whose buffer ends with the PCM; a second search replaces the curve.
 uint32_t position(std::vector<int16_t> pcm, int64_t duration_s, int32_t count) {
     pcm.shrink_to_fit();
     TAVO_CTX ctx = {};
@@ -119,13 +119,13 @@ TEST(PowerEnvelope, OneValuePerTwoSecondsFromSixOn) {
 }
 
 // Full power, and two silent seconds, two at a quarter of it, two at full: (0 + 1/4 + 1) / 3.
-TEST(PowerEnvelope, KnownLevels) {
+TEST(PowerEnvelope, IsTenLogOfMeanSquarePlusOne) {
     EXPECT_EQ(curve(levels("800 1", 1)), std::vector<float>(2, 10.0f * log10f(2.0f)));
     EXPECT_NEAR(curve(levels("1 0 1 .25 1 1", 200))[0], 10.0 * log10(1.0 + 1.25 / 3.0), 1e-4);
 }
 
-// Any number of windows, so that the parts summed side by side share one or none.
-TEST(PowerEnvelope, HasTheBitsOfEachWindowSummedAlone) {
+// Odd and even numbers of windows: the parts summed in parallel share one window or none.
+TEST(PowerEnvelope, EqualsEachWindowSummedAlone) {
     std::mt19937 random(11);
     for (int64_t windows = 1; windows <= 9; ++windows) {
         const int64_t samples = (windows + 2) * 2 * kSlow + windows * 13 % (2 * kSlow);
@@ -142,8 +142,8 @@ TEST(PowerEnvelope, HasTheBitsOfEachWindowSummedAlone) {
     }
 }
 
-// Above a mean of 0.5 a dip must lie 1.5 deviations below it, else one: at 0.375 both times.
-TEST(Valleys, EndsOfQuietStretches) {
+// Above a mean of 0.5 a dip must be 1.5 deviations below it, otherwise one: 0.375 in both cases.
+TEST(Valleys, AreTheEndsOfQuietStretches) {
     EXPECT_EQ(valleys({5}, 0.375f, 0.75f, 0.25f), indexes{});
     EXPECT_EQ(valleys({5}, 0.34375f, 0.75f, 0.25f), indexes{5});
     EXPECT_EQ(valleys({5}, 0.34375f), indexes{5});
@@ -159,7 +159,7 @@ TEST(Valleys, EndsOfQuietStretches) {
 
 // From 90 s on, edges count from point 9 on and up to 25 points before the end; below, from 0 and
 // up to 10.
-TEST(Search, Edges) {
+TEST(Search, ReturnsTheBestEdge) {
     const struct {
         const char *curve;
         int32_t duration_s;
@@ -211,9 +211,9 @@ TEST(Search, Edges) {
     for (const auto &c : cases) EXPECT_EQ(search(c.curve, c.duration_s), c.ms) << c.curve;
 }
 
-// Of many edges the ten largest count: of nine bursts and a passage the passage, of ten the first.
-// Of thirty passages the last, which is the loudest.
-TEST(Search, ManyPassages) {
+// The ten largest edges count: with nine bursts before a passage the passage wins, with ten the
+// first burst. Of thirty passages the last and loudest wins.
+TEST(Search, ComparesTenEdgesAndThirtyPassages) {
     std::string bursts = "12 0.25", passages;
     for (int k = 0; k < 9; ++k) bursts += " 1 0." + std::to_string(99 - k) + " 4 0.25";
     EXPECT_EQ(search(bursts + " 10 0.6 30 0.25", 210), 2000u * 56);
@@ -226,8 +226,8 @@ TEST(Search, ARequestedLengthMovesTheStart) {
     // Segments (9, 13) and (29, 49), no valleys; the edge at 29 is chosen and the region ends at
     // 49, 20 points on.
     const char *plain = "10 0.25 4 0.75 16 0.25 20 1 10 0.25";
-    // What passes the end begins at the first segment or the first valley, whichever is earlier, or
-    // at the one there is. The dips to 0.1 are far below the rest.
+    // A region that would exceed the song starts at the first segment or the first valley,
+    // whichever is earlier, or the only one. The dips to 0.1 are valleys.
     const char *valley_first = "20 0.5 1 0.1 9 0.5 20 1 5 0.5 1 0.1 4 0.5";
     const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
     const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
@@ -257,8 +257,8 @@ TEST(Search, ARequestedLengthMovesTheStart) {
     }
 }
 
-// In a song at 1, with a mean of 0.5.
-TEST(Region, Places) {
+// The mean is 0.5.
+TEST(Region, EndsAtAValleyOrAFall) {
     const char *loud = "120 1", *hundred = "100 1", *dip = "50 1 1 .375 3 1 1 .25 65 1";
     const char *falls = "50 1 4 .375 1 1 1 .25 1 1 2 .375 1 1 1 .375 1 1 2 .375 56 1";
     const struct {
@@ -306,13 +306,13 @@ TEST(Region, Places) {
         {"neither fits", hundred, 90, 11, {99}, {95, 99}, 0},
         {"the valley is earlier", hundred, 98, 3, {20}, {30, 99}, 20},
         {"endless", hundred, 90, INT32_MAX, {}, {}, 0},
-        {"behind the song", loud, 120, 15, {50}, {}, 0},
+        {"after the song", loud, 120, 15, {50}, {}, 0},
         {"before it", loud, -1, 15, {50}, {}, 0},
     };
     for (const auto &c : cases) {
         std::vector<float> norm = runs(c.curve);
         const auto n = static_cast<int32_t>(norm.size());
-        norm.resize(norm.size() + 3);  // low values behind the song, which must not count
+        norm.resize(norm.size() + 3);  // low values after the song, which must not count
         indexes found = c.valleys;
         found.resize(15);
         const auto nv = static_cast<int32_t>(c.valleys.size());
@@ -324,7 +324,7 @@ TEST(Region, Places) {
     }
 }
 
-TEST(Tune, StartsThatAreLeftAlone) {
+TEST(Tune, StartNearTheEndsOfTheSongIsReturnedUnchanged) {
     for (const uint32_t start : {0u, 2000u, 51001u, 52000u, 70000u}) {
         EXPECT_EQ(_tune_HL_simple(nullptr, kRate, start, 60), start);
     }
@@ -336,7 +336,7 @@ TEST(Tune, StartsThatAreLeftAlone) {
 // Frame k covers steps k to k + 2. A step to square c at step s: the rise at frame s - 3 is on
 // average (c/3 + 2c/3 + 3c) / 5 = 0.8 c, about 3.47 c dB, and counts above 0.13; after it the first
 // of the two equal steps of 0 is taken.
-TEST(Tune, Rises) {
+TEST(Tune, MovesToTheSharpestRise) {
     // Mean squares from frame 10 on: 0, 0.2, 0.3, 0.3, 0.2, 0.3, 0.3, 0.2, 0, so the largest rise
     // is at 10, and the only fall of its five steps leads from 13 to 14.
     const char *song = "13 0 1 .6 1 .3 1 0 1 .3 1 .6 12 0";
@@ -357,7 +357,7 @@ TEST(Tune, Rises) {
 // 120 s, loud from 60 s to 100 s. The window at 54 s is the last without the loud part: coarse
 // start 54 s. Of the 27 frames from 51 s on, frame 22 is half, 23 wholly at the loud level from
 // 60.2 s on; the rise is largest at 19, its smallest step leads from 23 to 24: 51 s + 9.2 s.
-TEST(Position, CoarseThenFine) {
+TEST(Position, IsTheTunedStart) {
     EXPECT_EQ(position(levels("60 .04 40 .64 20 .04", kRate), 120, 58), 60200u);
     EXPECT_EQ(position({}, 120, 0), 0u);
     EXPECT_EQ(position(levels("47999 .5", 1), 5, 0), 0u);
@@ -366,7 +366,7 @@ TEST(Position, CoarseThenFine) {
 }
 
 // The only edge leads to the window at 112 s, the last but one of 120 s, whose tuning would need
-// audio up to 120.6 s: the duration promises it, the PCM does not hold it. With that audio decoded
+// audio up to 120.6 s, which the duration states but the PCM does not have. With that audio decoded
 // the same start is tuned: of the frames from 109 s on, the rise is largest at 14, and 18 to 19 is
 // the level step after it: 109 s + 7.2 s.
 TEST(Position, TheTuningNeverReadsPastThePcm) {
