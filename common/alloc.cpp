@@ -9,6 +9,8 @@ namespace {
 
 constexpr int64_t kHugePageBytes = 2 << 20;  // of most systems
 
+int32_t incomplete = 0;  // atomic access only: threads of the job set it
+
 uintptr_t page_size() {
     return static_cast<uintptr_t>(sysconf(_SC_PAGESIZE));
 }
@@ -43,4 +45,16 @@ const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end) {
     if (first >= last) return begin;
     madvise(reinterpret_cast<void *>(first), last - first, MADV_DONTNEED);
     return reinterpret_cast<const uint8_t *>(last);
+}
+
+bool is_incomplete() {
+    return load_flag(&incomplete) != 0;
+}
+
+void mark_incomplete() {
+    store_flag(&incomplete, 1);
+}
+
+void clear_incomplete() {
+    store_flag(&incomplete, 0);
 }

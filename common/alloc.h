@@ -40,6 +40,19 @@ T *zeroed_items(int64_t count) {
     return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
 }
 
+// Whether a job lacks part of its audio or of its search, because a read or an allocation has
+// failed since tavo_decode_init cleared the mark. Process-wide, as the decoding is: one instance at
+// a time.
+bool is_incomplete();
+void mark_incomplete();
+void clear_incomplete();
+
+// Returns memory, after marking the job incomplete if it is null.
+inline void *note_shortage(void *memory) {
+    if (memory == nullptr) mark_incomplete();
+    return memory;
+}
+
 constexpr int64_t kLargeBytes = 4 << 20;  // from here on pages are worth the calls below
 
 // Asks for huge pages under a large buffer that is about to be filled: one page fault instead of

@@ -7,7 +7,6 @@
 #include "common/alloc.h"
 #include "highlight/position.h"
 #include "pcm/decode.h"
-#include "pcm/read_pcm.h"
 
 namespace {
 
@@ -121,7 +120,7 @@ extern "C" int32_t tavo_has_audio(const TAVO_CTX *ctx) {
 }
 
 extern "C" int32_t tavo_is_complete(const TAVO_CTX *ctx) {
-    return is_instance(ctx) && has_ended(ctx) && !has_read_failed() ? 1 : 0;
+    return is_instance(ctx) && has_ended(ctx) && !is_incomplete() ? 1 : 0;
 }
 
 extern "C" const float *tavo_get_loudness(const TAVO_CTX *ctx, int32_t *count) {

@@ -3,6 +3,7 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "common/alloc.h"
 #include "dsp/sort.h"
 
 namespace {
@@ -30,7 +31,8 @@ int64_t count_peaks(const Sample *x, int64_t len) {
 // out.
 template <typename Record, typename Sample>
 Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
-    auto *peaks = static_cast<Record *>(calloc(static_cast<size_t>(count), sizeof(Record)));
+    auto *peaks =
+        static_cast<Record *>(note_shortage(calloc(static_cast<size_t>(count), sizeof(Record))));
     if (peaks == nullptr) return nullptr;
     int64_t k = 0;
     for (int64_t i = 1; i + 1 < len; ++i) {
@@ -104,7 +106,8 @@ int32_t search_nearest(const int32_t *list, int32_t target, int32_t n) {
 int32_t write_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *priority,
                          int32_t n_priority, uint8_t *marks, int32_t *out) {
     if (count < 2 || n_priority < 1) return 0;
-    auto *list = static_cast<int32_t *>(malloc(static_cast<size_t>(count) * sizeof(int32_t)));
+    auto *list =
+        static_cast<int32_t *>(note_shortage(malloc(static_cast<size_t>(count) * sizeof(int32_t))));
     if (list == nullptr) return -1;
     for (int32_t k = 0; k < count; ++k) list[k] = peaks[k].index;
     int32_t priorities = 0;
@@ -134,7 +137,7 @@ int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
     auto *peaks = collect_peaks<PEAK_INFO_F>(x, len, count);
-    auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    auto *marks = static_cast<uint8_t *>(note_shortage(calloc(static_cast<size_t>(len), 1)));
     int32_t written = 0;
     if (peaks != nullptr && marks != nullptr) {
         qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO_F), compare_peak_f);
@@ -152,7 +155,7 @@ int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out)
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
     auto *peaks = collect_peaks<PEAK_INFO>(x, len, count);
-    auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    auto *marks = static_cast<uint8_t *>(note_shortage(calloc(static_cast<size_t>(len), 1)));
     int32_t written = 0;
     if (peaks != nullptr && marks != nullptr) {
         if (min_dist != 0) {
@@ -174,7 +177,7 @@ int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_
     const int64_t count = count_peaks(x, len);
     if (count == 0) return 0;
     auto *peaks = collect_peaks<PEAK_INFO>(x, len, count);
-    auto *marks = static_cast<uint8_t *>(calloc(static_cast<size_t>(len), 1));
+    auto *marks = static_cast<uint8_t *>(note_shortage(calloc(static_cast<size_t>(len), 1)));
     int32_t priorities = -1;
     if (peaks != nullptr && marks != nullptr) {
         priorities =

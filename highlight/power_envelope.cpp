@@ -3,6 +3,7 @@
 #include <cmath>
 #include <cstdlib>
 
+#include "common/alloc.h"
 #include "common/lanes.h"
 
 namespace {
@@ -75,7 +76,8 @@ int32_t _calc_power_level(const int16_t *pcm, int64_t sample_count, int32_t rate
     const int64_t hop = int64_t{kPowerHopSeconds} * rate;
     const int64_t count = last / hop + 1;
     if (count > INT32_MAX) return 0;
-    auto *power = static_cast<float *>(malloc(static_cast<size_t>(count) * sizeof(float)));
+    auto *power =
+        static_cast<float *>(note_shortage(malloc(static_cast<size_t>(count) * sizeof(float))));
     if (power == nullptr) return 0;
     overlapping_powers(pcm, hop, count, power);
     hl->power = power;

@@ -5,6 +5,7 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "common/alloc.h"
 #include "dsp/peaks.h"
 #include "dsp/stats.h"
 #include "highlight/power_envelope.h"
@@ -56,7 +57,7 @@ bool is_less(float a, float b) {
 // allocates nothing; qsort out of memory needs a comparator that can report equality.
 bool rank_curve(const float *power, int32_t n, float *largest, float *percentile) {
     const auto count = static_cast<size_t>(n);
-    auto *sorted = static_cast<float *>(malloc(count * sizeof(float)));
+    auto *sorted = static_cast<float *>(note_shortage(malloc(count * sizeof(float))));
     if (sorted == nullptr) return false;
     memcpy(sorted, power, count * sizeof(float));
     std::sort(sorted, sorted + count, is_less);
@@ -196,7 +197,7 @@ uint32_t search_curve(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm, fl
 uint32_t _get_HL_simple(TAVO_HL_CTX *hl, int32_t duration_s) {
     if (hl->power == nullptr || hl->power_count < 1) return 0;
     const auto count = static_cast<size_t>(hl->power_count);
-    auto *norm = static_cast<float *>(malloc(2 * count * sizeof(float)));
+    auto *norm = static_cast<float *>(note_shortage(malloc(2 * count * sizeof(float))));
     if (norm == nullptr) return 0;
     const uint32_t start = search_curve(hl, duration_s, norm, norm + count);
     free(norm);

@@ -204,9 +204,9 @@ int32_t tavo_get_tempo(const TAVO_CTX *ctx);
 int32_t tavo_has_audio(const TAVO_CTX *ctx);
 
 /** Whether the job decoded the file to its end: call it in the callback or after it. A result is
- * delivered even if the file could not be read or memory ran out in the middle of it; it then holds
- * for the part that was decoded. Returns 1; 0 before the job's end, if something is missing, or for
- * a bad handle. */
+ * delivered even if the file could not be read to its end or memory ran out; it then holds for the
+ * part that was analysed. Returns 1; 0 before the job's end, if something is missing, or for a bad
+ * handle. */
 int32_t tavo_is_complete(const TAVO_CTX *ctx);
 
 /** The loudness curve of the file, once a job of mode 0 or 2 has ended: value i is taken over the

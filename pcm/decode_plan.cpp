@@ -6,7 +6,6 @@
 #include "common/alloc.h"
 #include "common/limits.h"
 #include "common/worker_group.h"
-#include "pcm/read_pcm.h"
 
 pthread_mutex_t *ext_mutex_mt = nullptr;
 pthread_cond_t *ext_cond_mt = nullptr;
@@ -127,7 +126,7 @@ int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param) {
     ctx->seg = nullptr;
     ctx->pcm = nullptr;
     ctx->seg_count = 0;
-    clear_read_failed();
+    clear_incomplete();
     const int32_t err = build_decoding(ctx, &open_param);
     if (err != 0) tavo_decode_deinit(ctx);
     return err;

@@ -57,8 +57,8 @@ void tavo_decode_deinit(TAVO_CTX *ctx);
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
 }
 
-// Whether a stream can be analysed: TAVO_OK, TAVO_ERR_SHORT, TAVO_ERR_LOW_RATE, or TAVO_ERR_FORMAT
-// if its byte count overflows.
+// Returns TAVO_OK if the stream can be analysed; else TAVO_ERR_SHORT, TAVO_ERR_LOW_RATE, or
+// TAVO_ERR_FORMAT if its byte count overflows.
 int32_t check_stream(const mtsrc_format &format);
 
 #endif

@@ -44,7 +44,7 @@ int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_
                         int64_t *off) {
     auto *probe = static_cast<uint8_t *>(malloc(kProbeBytes));
     if (probe == nullptr) {
-        mark_read_failed();  // a second decoding may give other beats
+        mark_incomplete();  // a second decoding may give other beats
         return -1;
     }
 

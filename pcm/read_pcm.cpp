@@ -2,14 +2,12 @@
 
 #include <algorithm>
 
-#include "common/tavo_ctx.h"
+#include "common/alloc.h"
 
 namespace {
 
 // Consecutive empty reads before giving up; far more than any real stream produces.
 constexpr int32_t kMaxEmptyReads = 65'536;
-
-int32_t read_failed = 0;  // atomic access only: the segments' threads set it
 
 // Other codes are informational; the byte count is what matters.
 bool is_failure(int32_t result) {
@@ -28,22 +26,10 @@ void read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity, int64_t *got) {
         const int32_t delivered = std::clamp(frame.size, 0, want);
         empty_reads = delivered > 0 ? 0 : empty_reads + 1;
         if (is_failure(result) || empty_reads == kMaxEmptyReads) {
-            mark_read_failed();
+            mark_incomplete();
             break;
         }
         *got += delivered;
         if (result == kMtsrcEndOfStream) break;
     }
-}
-
-bool has_read_failed() {
-    return load_flag(&read_failed) != 0;
-}
-
-void mark_read_failed() {
-    store_flag(&read_failed, 1);
-}
-
-void clear_read_failed() {
-    store_flag(&read_failed, 0);
 }

@@ -14,10 +14,4 @@ constexpr int64_t kReadBytes = 8192;  // largest single request to a source
 // read are not counted.
 void read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity, int64_t *got);
 
-// Whether a read, or the memory for one, has failed since tavo_decode_init cleared the record. It
-// is process-wide, as the decoding is: one instance at a time.
-bool has_read_failed();
-void mark_read_failed();
-void clear_read_failed();
-
 #endif

@@ -60,7 +60,7 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
     return ready ? 0 : TAVO_ERR_MEMORY;
 }
 
-// Whether out may be the memory of in: the interpolator has read all of its input before it writes
+// True if out may be the memory of in: the interpolator has read all of its input before it writes
 // there, and four samples occupy the bytes of one output.
 bool works_in_place(const conversion &plan) {
     const int32_t whole = whole_ratio(plan.ratio);

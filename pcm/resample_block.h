@@ -38,7 +38,7 @@ extern pthread_mutex_t *ext_mutex_resample;
 extern pthread_cond_t *ext_cond_resample;
 
 // Block average of count samples into out[n]. Leaves out as it was if memory runs out. Makes the
-// lock itself if there is none.
+// lock itself if none exists.
 void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, double *out,
                        int64_t n, int32_t ana_rate);
 

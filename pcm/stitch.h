@@ -14,8 +14,8 @@ extern "C" {
 void stereo2mono(int16_t *dst, const int16_t *src, int32_t frames);
 }
 
-// What becomes of a segment's buffer once it is stitched: it stays allocated in any case. Released:
-// the pages of a large buffer go back to the system, and the buffer reads as zeros.
+// A segment's buffer stays allocated once it is stitched. kept: with its bytes. released: the pages
+// of a large buffer go back to the system, and it reads as zeros.
 enum class segment_pages { kept, released };
 
 // One second of PCM, bytes. Every segment but the first drops it, because a decoder that has just

@@ -40,7 +40,7 @@ constexpr int kOpenedOnly = -1;
 
 // What a run came to.
 struct outcome {
-    int32_t created = 99, started = 0, released = 0, state = 0;
+    int32_t created = 99, started = 0, released = 0, state = 0, complete = 0;
     int64_t met = 0, refused = 0;  // calls
     int64_t early = 0;             // of those refused, before the job
     double song_ms = 0.0;
@@ -72,6 +72,7 @@ outcome run(const std::string &path, int mode, const plan &by) {
         out.started = mode == kOpenedOnly ? 1 : tavo_analyze(ctx, 0, 0, 0);
         if (out.started == 0) job::wait();
         out.state = load_flag(&ctx->state);
+        out.complete = tavo_is_complete(ctx);
         out.released = tavo_deinit(ctx);
     }
     out.met = fault::met();
@@ -104,6 +105,7 @@ const char *flaw_of(const outcome &found, int mode, const group &kind, const pla
     const job::result &a = found.result, &b = undisturbed.result;
     const bool same = a.status == b.status && a.hl_pos == b.hl_pos && a.beats == b.beats;
     if (!same && (kind.unharmed || found.refused == found.early)) return "result";
+    if (!same && a.status == 0 && found.complete == 1) return "another result, said to be complete";
     if (a.hl_pos < 0 || a.hl_pos > found.song_ms) return "highlight";
     const bool inside = a.beats.empty() || (a.beats.front() >= static_cast<float>(a.hl_pos) &&
                                             a.beats.back() <= found.song_ms);
