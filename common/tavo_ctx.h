@@ -1,4 +1,4 @@
-// The records that several folders share: the instance, TAVO_CTX, and what hangs from it.
+// The records that several folders share: the instance, TAVO_CTX, and its parts.
 //
 // The instance owns everything that its pointers lead to, except the callback. The decoding counts
 // time in 100-ns units (10,000,000 per second), results are in milliseconds. Made and released by

@@ -1,5 +1,4 @@
-// The instance: how it is made whole or not at all, told from other memory, and released in one
-// place.
+// The instance: its creation, its check and its release.
 //
 // In: TAVO_PARAM. Out: TAVO_CTX with its sub-contexts and a planned decoding.
 // Before: pcm/decode.h. After: core/lifecycle.h.

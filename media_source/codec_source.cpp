@@ -6,7 +6,7 @@
 
 namespace {
 
-// What lasts for one call of get_frm.
+// State of one call of get_frm.
 struct decoding {
     const codec_source *source;
     wexa_output output;

@@ -1,5 +1,5 @@
-// Stage 1, behind the frame: what all formats but WAV share. A codec source pairs a container with
-// a codec of the codec library.
+// Stage 1, below mtsrc.h: the code that all formats except WAV share. A codec source pairs a
+// container with a codec of the codec library.
 //
 // In: the library's reader or demuxer and its decoder, in the handle. Out: PCM in the queue.
 // Called by the operations of each format.
@@ -27,7 +27,7 @@ struct container_ops {
 struct codec_ops {
     int32_t code;         // of the codec library
     int32_t frame_bytes;  // largest compressed frame
-    int32_t spare_bytes;  // that a frame's PCM may take beyond q_room before its reduction
+    int32_t spare_bytes;  // by which a frame's PCM may exceed q_room before its reduction
     int32_t min_rate;     // Hz, of the streams accepted
     int32_t max_rate;     // Hz
     int32_t (*decode)(void *decoder, const wexa_frame *frame, wexa_output *output,
@@ -56,7 +56,7 @@ int32_t codec_source_keep_all(const mtsrc_ctx *src, int32_t bytes, int64_t first
 // failed.
 int32_t codec_source_begin_open(mtsrc_ctx *src, int32_t (*init)());
 
-// Takes over the decoder, which may be null, and stores what the handle tells about the stream.
+// Stores the decoder, which may be null, and the stream's format in the handle, which owns both.
 // Returns 0; TAVO_ERR_CODEC without a decoder, TAVO_ERR_FORMAT for a rate that is not accepted.
 int32_t codec_source_use(mtsrc_ctx *src, const codec_ops &codec, void *decoder,
                          const mtsrc_format &format);

@@ -1,4 +1,4 @@
-// Stage 1, behind codec_source.h: the two codecs that occur both bare and in MP4.
+// Stage 1, below codec_source.h: the two codecs that occur both bare and in MP4.
 //
 // In: the stream as its reader or its track describes it. Out: a decoder in the handle.
 #ifndef TAVO_MEDIA_SOURCE_CODECS_H

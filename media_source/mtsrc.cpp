@@ -108,7 +108,7 @@ mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t /*flags*/, int32_t *err) 
 
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt) {
     if (!is_open(src) || fmt == nullptr) return TAVO_ERR_HANDLE;
-    // Field by field: the gap behind bits belongs to the caller.
+    // Field by field: the gap after bits belongs to the caller.
     fmt->sample_rate = src->format.sample_rate;
     fmt->channels = src->format.channels;
     fmt->bits = src->format.bits;

@@ -1,5 +1,5 @@
 /// @file
-/// Stage 1: turns an audio file into a stream of 16-bit mono PCM bytes that is read in pieces of
+/// Stage 1: turns an audio file into a stream of 16-bit mono PCM bytes that is read in requests of
 /// any size and positioned by time.
 ///
 /// In: a path. Out: PCM at the stream's own rate, native byte order. Called by pcm/decode.h.
@@ -27,7 +27,7 @@ static_assert(offsetof(mtsrc_format, duration) == 16);
 
 /// The caller's request.
 struct mtsrc_frame {
-    void *data;    ///< room for the bytes wanted
+    void *data;    ///< buffer for the bytes requested
     int32_t size;  ///< receives the bytes delivered
 };
 
@@ -82,8 +82,8 @@ int32_t mtsrc_deinit(mtsrc_ctx *src);
 /// fits) and the file offset where it was; -6 when 16 bytes cannot be read.
 int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type);
 
-/// The probes, in the order of their calls. head: the first 16 bytes of the file, which stands at
-/// any offset and is left there. A probe uses only read, tell, seek and skip of io. Returns a type
+/// The probes, in the order of their calls. head: the first 16 bytes of the file, whose offset
+/// may be any and is restored. A probe uses only read, tell, seek and skip of io. Returns a type
 /// code.
 /// @{
 int32_t mtsrc_probe_asf(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);

@@ -10,7 +10,7 @@
 #include "media_source/mtsrc.h"
 
 constexpr int32_t kQueueBytes = 1'048'576;  // of q_cap
-// Allocated behind the queue's q_cap bytes: the largest FLAC block decodes to 262,140 bytes, of
+// Allocated after the queue's q_cap bytes: the largest FLAC block decodes to 262,140 bytes, of
 // which half are left in one channel, and q_room exceeds 131,070 before each frame.
 constexpr int32_t kQueueSpareBytes = 131'070;
 
@@ -39,7 +39,7 @@ struct mtsrc_ctx {
     uint8_t *q_base;  // [q_cap + kQueueSpareBytes] owned
     int32_t q_cap;    // bytes
     int32_t q_fill;   // bytes held
-    int32_t q_room;   // bytes free behind q_wr
+    int32_t q_room;   // bytes free after q_wr
     uint8_t *q_rd;
     uint8_t *q_wr;
     int32_t frm_buf_size;  // bytes of one compressed frame's buffer

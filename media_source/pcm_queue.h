@@ -1,5 +1,5 @@
 // The queue between a source's decoder and the caller: PCM goes in frame by frame at q_wr and comes
-// out at q_rd in pieces of any size.
+// out at q_rd in requests of any size.
 //
 // In: 16-bit interleaved PCM of one frame. Out: the bytes that the caller wants, one channel.
 #ifndef TAVO_MEDIA_SOURCE_PCM_QUEUE_H
@@ -17,7 +17,7 @@ struct pcm_fill {
 
 void pcm_queue_clear(mtsrc_ctx *src);
 
-// Takes over bytes that now lie at q_wr; at most q_room.
+// Counts bytes that were written at q_wr; at most q_room.
 void pcm_queue_push(mtsrc_ctx *src, int32_t bytes);
 
 // The body of every get_frm: fills until want bytes are held and delivers them. Returns 0;

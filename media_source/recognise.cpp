@@ -17,7 +17,7 @@ bool is_at(const uint8_t *head, size_t at, const char *name) {
     return memcmp(head + at, name, 4) == 0;
 }
 
-// Reads count bytes behind an ID3v2 tag, or at the current offset without one, and restores the
+// Reads count bytes after an ID3v2 tag, or at the current offset without one, and restores the
 // offset.
 bool peek_behind_tag(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file, uint8_t *bytes,
                      int32_t count) {

@@ -30,7 +30,8 @@ int32_t mtsource_wav_open(mtsrc_ctx *src) {
     xwav_info info = {};
     int32_t word = 0;
     void *reader = xwavd_create(&src->io, &info, &word);
-    // Tested before the reader: none with an empty record is a matter of format, not of access.
+    // Check the record first: a null reader with an empty record means an unsupported format, not
+    // an I/O error.
     if (info.codec != kWexaPcm || info.bits != kBitsPerSample) {
         if (reader != nullptr) xwavd_delete(reader);
         return TAVO_ERR_FORMAT;

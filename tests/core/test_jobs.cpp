@@ -33,7 +33,7 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     return result;
 }
 
-// Whether a drum is hit within two hops of a time in ms.
+// True if a drum is hit within two hops of a time in ms.
 bool on_a_hit(float ms) {
     const std::vector<double> &hits = core_song::whole().song.hits;
     return std::any_of(hits.begin(), hits.end(), [ms](double hit) {
@@ -70,8 +70,8 @@ int32_t read_nothing(mtsrc_ctx *, int32_t, mtsrc_frame *) {
     return TAVO_ERR_READ;
 }
 
-// What cannot be decoded, and what cannot be converted, fails in the modes with beats, together
-// with the highlight found before; the host of mode 0 asks for the audio.
+// A failing decoding or conversion is reported in the modes with beats, with the highlight that was
+// found before; in mode 0, tavo_has_audio reports it.
 TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     for (const bool decodes : {false, true}) {
         for_each_mode(kModes, [decodes](int32_t mode, TAVO_CTX *ctx) {

@@ -125,7 +125,7 @@ TEST(Lifecycle, BadHandlesTouchNothing) {
     EXPECT_TRUE(wrong.state == 1 && wrong.quit == 0);
 }
 
-// For its mode, or for want of a thread.
+// Its mode is unknown, or the thread is refused.
 TEST(Lifecycle, AJobThatCannotStartLeavesTheInstanceReady) {
     for_each_mode({-1, 3, TAVO_MODE_HIGHLIGHT}, [](int32_t mode, TAVO_CTX *ctx) {
         fault::arm({fault::kThread, 0});
@@ -153,7 +153,7 @@ void stay_until_waited_for(TAVO_INFO *) {
         pthread_mutex_unlock(&tavo_mutex);
         std::this_thread::yield();
     }
-    // A release that does not wait is over by then.
+    // By then a release that does not wait has returned.
     std::this_thread::sleep_for(std::chrono::milliseconds(20));
     visit.left = true;
 }

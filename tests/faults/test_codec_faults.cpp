@@ -1,5 +1,5 @@
-// Every value that the codec library hands back is made wrong at every call, once and from there
-// on, and a job runs in every mode: it is refused or reports once, nothing is left or hangs.
+// Every value that the codec library returns is made wrong at every call, once and from there on,
+// and a job runs in every mode: it is refused or reports once, nothing leaks or hangs.
 #include <sys/resource.h>
 #include <unistd.h>
 
@@ -28,7 +28,7 @@ constexpr int64_t kFrame = 8192;  // samples
 // The quick tier tries this many calls of a value, and one in so many of the answers there.
 constexpr int kCalls = 2, kStep = 31;
 
-// What each value is replaced by: anything, and what is close to a limit of its own.
+// The replacements of each value: general ones, and those close to a limit of its own.
 std::vector<int64_t> answers_for(const std::string &value) {
     static std::map<std::string, std::vector<int64_t>> all = {
         {"bytes", {16'384, 16'385, 131'071, 1'048'576, 1'048'577}},
@@ -47,7 +47,7 @@ std::vector<int64_t> answers_for(const std::string &value) {
 
 using place = std::pair<std::string, std::string>;  // function and value
 
-// The fault of the run going on. The hook runs under the scripted library's lock; between runs no
+// The fault of the current run. The hook runs under the fake library's lock; between runs no
 // other thread is alive.
 struct fault {
     place where = {};
@@ -88,7 +88,7 @@ char current[256];  // the run that hangs
 
 class CodecFaults : public testing::TestWithParam<std::string> {
  protected:
-    // One job on the script with the fault. True when all is as promised.
+    // Runs one job with the fault. Returns true if all promises hold.
     bool run(int32_t mode) {
         scripted::all = {};
         scripted::all.use(script);

@@ -16,7 +16,7 @@ namespace {
 
 using fault::plan;
 
-// Some kinds of calls that fail together. unharmed: the result is the undisturbed one all the same.
+// Kinds of calls that fail together. unharmed: the result is the undisturbed one all the same.
 struct group {
     const char *name;
     uint32_t calls;
@@ -38,7 +38,7 @@ constexpr group kGroups[] = {
 };
 constexpr int kOpenedOnly = -1;
 
-// What a run came to.
+// The outcome of a run.
 struct outcome {
     int32_t created = 99, started = 0, released = 0, state = 0, complete = 0;
     int64_t met = 0, refused = 0;  // calls
@@ -83,7 +83,7 @@ outcome run(const std::string &path, int mode, const plan &by) {
     return out;
 }
 
-// Null when all is as promised.
+// Null if all promises hold, else the broken one.
 const char *flaw_of(const outcome &found, int mode, const group &kind, const plan &by,
                     const outcome &undisturbed) {
     if (found.created != 0) {
@@ -101,11 +101,12 @@ const char *flaw_of(const outcome &found, int mode, const group &kind, const pla
     if (found.started != (no_job ? TAVO_ERR_MEMORY : 0)) return "code of tavo_analyze";
     if (no_job) return found.result.calls == 0 ? nullptr : "callback without a job";
     if (found.state != (found.result.status == 0 ? kStateFinished : kStateFailed)) return "state";
-    // What was met while opening is reported there or does no harm.
+    // A failure while opening is reported there or does no harm.
     const job::result &a = found.result, &b = undisturbed.result;
     const bool same = a.status == b.status && a.hl_pos == b.hl_pos && a.beats == b.beats;
     if (!same && (kind.unharmed || found.refused == found.early)) return "result";
-    if (!same && a.status == 0 && found.complete == 1) return "another result, said to be complete";
+    if (!same && a.status == 0 && found.complete == 1)
+        return "another result, reported as complete";
     if (a.hl_pos < 0 || a.hl_pos > found.song_ms) return "highlight";
     const bool inside = a.beats.empty() || (a.beats.front() >= static_cast<float>(a.hl_pos) &&
                                             a.beats.back() <= found.song_ms);

@@ -12,7 +12,7 @@ namespace {
 
 using std::chrono::microseconds;
 
-// True when the stop came before the report.
+// True if the stop came before the report.
 bool stopped_after(microseconds delay, int32_t mode, bool told, bool elsewhere) {
     TAVO_CTX *ctx = job::create(SHORT_SONGS "/long.wav", mode);
     if (!told) tavo_setcallback(ctx, nullptr);

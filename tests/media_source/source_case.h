@@ -1,5 +1,5 @@
 // Files by their content, one row for each format source, and a fixture that opens and reads them.
-// What comes out of the decoders is the scripted codec library's.
+// The fake codec library decides what the decoders deliver.
 #ifndef TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 #define TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 

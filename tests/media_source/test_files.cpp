@@ -50,7 +50,7 @@ TEST(FileIo, Callbacks) {
     EXPECT_EQ(mtsrc_file_close(new (malloc(sizeof handle)) mtsrc_file{-1}), 0);
 }
 
-// The type of a file that stands at the content, or the code of a failure. The record has the
+// The type of a file positioned at the content, or the code of a failure. The record has the
 // callbacks that probes may use.
 int32_t type_of(std::string content, decltype(mtsrc_io::seek) seek = mtsrc_file_seek) {
     mtsrc_io io = {};
@@ -146,7 +146,7 @@ TEST(ProbeMpeg, TwoHeadersOneFrameLengthApart) {
 
 // Free format and Layers II and I of MPEG-2.5, whose lengths do not matter in a follower. No
 // bitrate, no rate, no version, no layer, 10 bits of sync, no sync byte.
-TEST(ProbeMpeg, WhatIsNoHeader) {
+TEST(ProbeMpeg, InvalidHeadersAreRejected) {
     const std::pair<const char *, int32_t> cases[] = {
         {"\xFF\xFB\x01", 305},  {"\xFF\xE5\x90", 304},  {"\xFF\xE7\x90", 303},
         {"\xFF\xFB\xF0", 2199}, {"\xFF\xFB\x9C", 2199}, {"\xFF\xEB\x90", 2199},
@@ -159,12 +159,12 @@ TEST(ProbeMpeg, WhatIsNoHeader) {
     expect_type(2199, {pair("\xFF\xE5\x90", 1044), pair("\xFF\xE7\x90", 624)});
 }
 
-TEST(ProbeMpeg, WhereTheScanGoesOnAndEnds) {
+TEST(ProbeMpeg, ScanContinuesAfterARejectedCandidate) {
     // Two candidates overlap: at 0 a Layer I frame of 488 bytes without a follower, at 1 a Layer
     // III frame of 52.
     const std::string overlap = put("\xFF\xFF\xE2\x10", 53, "\xFF\xE2\x10\0"s) + zeros(600);
     expect_type(305, {"\xFF\xFB\x90" + kLayer3Pair, overlap});
-    // A follower at 32,764 ends the scan: a shorter pair behind the candidate counts no more.
+    // A follower at 32,764 ends the scan: a shorter pair after the candidate is not seen.
     const std::string late = put(zeros(kScanBytes), 32500, pair("\xFF\xFF\x10", 32));
     expect_type(305, {put(zeros(kScanBytes), 32763 - 417, kLayer3Pair)});
     expect_type(303, {late});

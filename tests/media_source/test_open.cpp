@@ -1,4 +1,4 @@
-// Opening and closing: through the frame and through each format's own operations.
+// Opening and closing, through mtsrc.h and through each format's own operations.
 #include <fcntl.h>
 
 #include <tuple>
@@ -29,7 +29,7 @@ TEST_F(OpenClose, CallsRecordsAndOrder) {
     });
 }
 
-// The open that fails gives back what it initialised, then the frame closes once more.
+// A failing open de-initialises the codec library, then mtsrc_open_mfal closes the source again.
 TEST_F(OpenClose, EachFailingStepIsCleanedUp) {
     for_each_row([&](const source_row &row) {
         const size_t libraries = row.decoder.empty() ? 0 : row.tag ? 2 : 1;

@@ -13,7 +13,7 @@ scripted::frame group(int16_t value, int32_t decode = 0, int32_t produced = 1) {
     return {{value, value}, 1000 + value, 0, decode, produced};
 }
 
-// What is delivered of such groups: one sample, but by Ogg both.
+// The samples delivered of such groups: one, in Ogg both.
 samples expected_of(const source_row &row, const samples &values) {
     samples out;
     for (const int16_t value : values) out.insert(out.end(), row.codec == 323 ? 2 : 1, value);
@@ -128,8 +128,8 @@ TEST_F(Reading, ReductionsAndTheDelayOfMpegDecoders) {
     }
 }
 
-// The largest block, 65,535 sample pairs, decodes to twice the bytes that the queue has room for.
-TEST_F(Reading, FlacHasRoomForItsLargestBlock) {
+// The largest block, 65,535 sample pairs, decodes to twice the bytes free in the queue.
+TEST_F(Reading, FlacBlocksOfAnySizeFitTheQueue) {
     samples block, expected;
     for (size_t i = 0; i < 131'070; ++i) block.push_back(static_cast<int16_t>(i / 2));
     for (size_t i = 0; i < 655'350; ++i) expected.push_back(block[i % 65'535 * 2]);
@@ -141,7 +141,7 @@ TEST_F(Reading, FlacHasRoomForItsLargestBlock) {
 }
 
 // Ogg delivers each decoded byte: 160 frames of 16,384 bytes, each sample the frame's number.
-TEST_F(Reading, TheQueueDeliversAnyPiece) {
+TEST_F(Reading, RequestsOfAnySizeAreDelivered) {
     frames numbered;
     for (int16_t i = 0; i < 160; ++i) {  // from frames that fill their buffer
         numbered.push_back({samples(8192, i), 1, 0, 0, 1, {}, 16'384});
@@ -153,13 +153,13 @@ TEST_F(Reading, TheQueueDeliversAnyPiece) {
     EXPECT_EQ(read(-1).first, -4);
     EXPECT_EQ(mtsrc_getstream(src, 10, &no_data), -4);
     EXPECT_EQ(mtsrc_getstream(src, 10, nullptr), -4);
-    // A room of just one frame's size is too short: the bytes move first.
+    // Free bytes of exactly one frame's size do not suffice: the bytes move first.
     for (int16_t i = 0; i < 63; ++i) EXPECT_EQ(read(16'384), result(0, samples(8192, i)));
     expect_queue(1'032'192, 1'032'192);
     EXPECT_EQ(read(2), result(0, {63}));
     expect_queue(2, 16'384);
     EXPECT_EQ(read(16'382), result(0, samples(8191, 63)));
-    // 63 frames leave room for one frame, which is too short, and are kept.
+    // 63 frames leave the bytes of one frame free, which do not suffice; the frames are kept.
     EXPECT_EQ(read(1'048'575), result(-4, {}));
     expect_queue(0, 1'032'192);
     for (int16_t i = 64; i < 160; ++i) EXPECT_EQ(read(16'384), result(0, samples(8192, i)));
@@ -205,7 +205,7 @@ TEST_F(Reading, SeeksAndResets) {
     src->codec = 306;
 }
 
-// The frame that is asked about is consumed.
+// The frame that aac_get_hz reads is consumed.
 TEST_F(Reading, AacRateOfTheNextFrame) {
     open_frames(row_of("aac"),
                 {{{2, 2}, 9, 0, 0, 1, {}, 24'576}, {{4, 4}, 9, 0, 0, 1, {}, 24'577}, group(6)});

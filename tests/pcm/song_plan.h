@@ -1,5 +1,5 @@
-// An instance whose decoding the library has planned, for a stream that the scripted codec library
-// describes and whose bytes the test plays.
+// An instance whose decoding the library has planned, for a stream that the fake codec library
+// describes and whose bytes the test supplies.
 #ifndef TAVO_TESTS_PCM_SONG_PLAN_H
 #define TAVO_TESTS_PCM_SONG_PLAN_H
 
@@ -20,7 +20,7 @@ using support::noise, support::slice;
 using sample_run = std::vector<int16_t>;
 using signal_run = std::vector<double>;
 
-// The n values of a conversion's output and the 64 cleared bytes behind them. Frees the output.
+// The n values of a conversion's output and the 64 cleared bytes after them. Frees the output.
 inline signal_run taken(double *out, int64_t n) {
     signal_run result(out, out + n + 8);
     free(out);
@@ -38,15 +38,15 @@ inline signal_run converted(const void *pcm, size_t bytes, int32_t rate) {
     return taken(out, n);
 }
 
-// What a source plays once it is planned, and what it saw.
+// The stream that a source delivers once it is planned, and the requests that it received.
 struct player {
     std::string stream = {};
     int64_t at = 0;               // next byte
     int64_t fail_at = INT64_MAX;  // byte from which on reads fail
-    int empty_replies = 0;        // reads that bring nothing before the others do
+    int empty_replies = 0;        // number of empty reads before the others
     int32_t code = 0;             // of a read within the stream
-    int64_t land = -1;            // byte where the next seek lands, whatever it is asked
-    int64_t report = -1;          // units that the next seek reports, whatever it is asked
+    int64_t land = -1;            // byte that the next seek reaches, whatever it asks for
+    int64_t report = -1;          // units that the next seek reports, whatever it asks for
     bool seek_fails = false;      // the next one, without a report
     std::vector<int64_t> seeks = {};
     int32_t most_wanted = 0;
@@ -92,7 +92,7 @@ class song_plan : public testing::Test {
         EXPECT_TRUE(scripted::all.alive.empty());
         EXPECT_TRUE(scripted::all.faults.empty());
     }
-    // The code of tavo_decode_init. The sources play stream from where setup moved them.
+    // Returns the code of tavo_decode_init. The sources deliver stream from the position of setup.
     int32_t plan(int64_t duration, int32_t rate, const std::string &stream = {}) {
         release();
         std::ofstream(file.path) << head;

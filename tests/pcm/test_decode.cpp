@@ -5,9 +5,9 @@ namespace {
 constexpr int64_t kTenSeconds = 100'000'000;  // units
 constexpr int32_t kRate = 8000;               // the skip is 16,000 bytes
 
-using decode_plan = song_plan;
+using DecodePlan = song_plan;
 
-TEST_F(decode_plan, what_is_refused_and_how_it_is_cut) {
+TEST_F(DecodePlan, RefusesShortStreamsAndCutsTheOthers) {
     constexpr int64_t kSetup = INT64_MAX;  // no second plan
     const struct {
         int64_t duration, start;
@@ -24,8 +24,8 @@ TEST_F(decode_plan, what_is_refused_and_how_it_is_cut) {
         {200'000'000, 100'000'000, 8000, 0, 4, 160'000},
         {200'000'000, 149'999'999, 8000, 0, 4, 80'000},  // 5 s and a unit
         {200'000'000, 150'000'000, 8000, 0, 1, 80'000},
-        {50'000'000, -10'000'000, 8000, 0, 1, 96'000},     // no more than the records
-        {200'000'000, 200'000'000, 8000, -2, 1, 0},        // nothing left: steps are done
+        {50'000'000, -10'000'000, 8000, 0, 1, 96'000},     // as many segments as records
+        {200'000'000, 200'000'000, 8000, -2, 1, 0},        // nothing left
         {200'000'000, 199'999'999, 8000, -2, 1, 0},        // no whole byte
         {200'000'000, 200'000'001, 8000, -2, 0, 320'000},  // refused at once
         {200'000'000, INT64_MIN, 8000, -2, 0, 320'000},
@@ -63,7 +63,7 @@ TEST_F(decode_plan, what_is_refused_and_how_it_is_cut) {
             EXPECT_TRUE(seg.duration == each.duration && seg.fmt.sample_rate == each.rate);
         }
     }
-    // A table of one record of a longer stream: no record after it is touched, and got stays.
+    // In a table of one record of a longer stream, no record after it is touched, and got stays.
     ASSERT_EQ(plan(50'000'000, kRate), 0);
     free(ctx.pcm);
     free(ctx.seg[0].buf);
@@ -77,12 +77,12 @@ TEST_F(decode_plan, what_is_refused_and_how_it_is_cut) {
     for (int32_t i = 0; i < 4; ++i) EXPECT_EQ(ctx.seg[i].seek_pos, 1234);
 }
 
-TEST_F(decode_plan, all_sources_that_were_opened_are_closed) {
+TEST_F(DecodePlan, ClosesEverySourceThatWasOpened) {
     for (size_t good = 0; good <= 4; ++good) {
         std::deque<int32_t> &answers = scripted::all.answers["xflac_init"];
         answers.assign(good, 0);
         answers.push_back(1);
-        // The probe, whatever its own code; a segment's own code.
+        // A failing probe is -4 whatever its code; a failing segment keeps its code.
         EXPECT_EQ(plan(kTenSeconds, kRate), good == 0 ? -4 : -255) << good;
         EXPECT_TRUE(ctx.seg == nullptr && scripted::all.alive.empty());
     }
@@ -96,9 +96,9 @@ TEST_F(decode_plan, all_sources_that_were_opened_are_closed) {
 }
 
 // Ten seconds at 8000 Hz in four segments of 2.5 s.
-class decode_run : public song_plan {
+class Decode : public song_plan {
  protected:
-    // Of a stream that ends after so many bytes.
+    // Plans the decoding of a stream that ends after so many bytes.
     void lay(int64_t end = 160'000) {
         ASSERT_EQ(plan(kTenSeconds, kRate, slice(stream, 0, end)), 0);
     }
@@ -108,7 +108,7 @@ class decode_run : public song_plan {
 };
 
 // The last segment starts at byte 120,000 and needs more than its skip.
-TEST_F(decode_run, seams_vanish) {
+TEST_F(Decode, OverlapsAreSplicedWithoutATrace) {
     for (const int64_t end : {160'000, 159'999, 136'200, 136'000, 120'000, 100'000}) {
         const int64_t want = end > 136'000 ? end : 0;
         lay(end);
@@ -126,7 +126,7 @@ TEST_F(decode_run, seams_vanish) {
     EXPECT_EQ(decode(), 0);
 }
 
-TEST_F(decode_run, failure_codes_and_empty_replies) {
+TEST_F(Decode, FailuresEndASegmentAndEmptyReadsDoNot) {
     const auto bytes = [&](int32_t code, int replies) {
         lay();
         for (auto &source : sources) source.code = code;
@@ -143,7 +143,7 @@ TEST_F(decode_run, failure_codes_and_empty_replies) {
     EXPECT_EQ(ctx.seg[0].got, 57'344);
 }
 
-TEST_F(decode_run, seam_is_laid_at_the_last_match) {
+TEST_F(Decode, SpliceIsAtTheLastMatch) {
     const std::string a = noise(1000, 1), b = noise(200, 2), tail = noise(500, 3);
     const std::string silence = support::zeros(3000), blip = support::zeros(199) + "\7",
                       one = "\x9";
@@ -164,9 +164,9 @@ TEST_F(decode_run, seam_is_laid_at_the_last_match) {
         {"199 bytes after the skip", a, slice(a, 300, 499), a + slice(a, 300, 499)},
         {"silence is not a block that ends loud", silence, blip, silence + blip},
         {"nor hides it", silence + blip + silence, blip, silence + blip},
-        {"rewound room is used again", a, slice(a, 600, 1000) + b, a + slice(b, 0, 100), 1100},
+        {"rewound bytes are used again", a, slice(a, 600, 1000) + b, a + slice(b, 0, 100), 1100},
         {"the rest is cut off", a, tail, a + slice(tail, 0, 100), 1100},
-        {"no room for the second", a, tail, {}, 1000},
+        {"no capacity for the second", a, tail, {}, 1000},
     };
     for (const auto &each : cases) {
         SCOPED_TRACE(each.name);
@@ -180,7 +180,7 @@ TEST_F(decode_run, seam_is_laid_at_the_last_match) {
     }
 }
 
-TEST(stereo2mono, halves_toward_zero) {
+TEST(Stereo2Mono, RoundsTowardZero) {
     const int16_t frames[] = {-3, 0, 3, 0, 32767, 32767, -32768, -32768, 32767, -32768};
     sample_run mono(6, 77);
     stereo2mono(mono.data(), frames, 5);

@@ -13,8 +13,8 @@ constexpr int64_t kBlock = 4608;            // where the probe's block begins, b
 
 using positions = std::vector<int64_t>;
 
-// Twenty seconds at 8000 Hz in four segments, as the job of mode 2 finds them.
-class from_highlight : public song_plan {
+// Twenty seconds at 8000 Hz in four segments, decoded as in mode 2.
+class FromHighlight : public song_plan {
  protected:
     void decode(const std::string &played) {
         ASSERT_EQ(plan(kDuration, kRate, played), 0);
@@ -22,7 +22,7 @@ class from_highlight : public song_plan {
         ctx.ana_rate = kAnalysisRate;
         ASSERT_EQ(DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes), kBytes);
     }
-    // The analysis signal of a highlight at pos is that of these bytes, and reported as hl_pos.
+    // Expects the analysis signal of these bytes for a highlight at pos, reported as hl_pos.
     void expect_from(int64_t pos, const std::string &bytes, uint32_t hl_pos) {
         EXPECT_EQ(tavo_get_from_here(&ctx, pos), 0);
         EXPECT_EQ(ctx.pcm, nullptr);
@@ -35,7 +35,7 @@ class from_highlight : public song_plan {
     TAVO_HL_CTX hl = {0, nullptr, 0, 4711};
 };
 
-TEST_F(from_highlight, no_seek_in_the_first_second) {
+TEST_F(FromHighlight, FirstSecondIsTheStartOfTheFile) {
     decode(stream);
     expect_from(1000, stream, 0);
     EXPECT_TRUE(sources[0].seeks.empty());
@@ -52,24 +52,24 @@ TEST_F(from_highlight, no_seek_in_the_first_second) {
     EXPECT_EQ(sources[0].seeks, (positions{25'000'000, 25'000'000}));
 }
 
-TEST_F(from_highlight, where_the_landing_point_is_found) {
-    // A landing point at 2500 ms is expected at byte 40,000, and its block looked for at bytes
-    // 24,000 to 87,999; at 1100 ms at 17,600 and from 1600 on.
+TEST_F(FromHighlight, SeekPositionIsFoundInThePcm) {
+    // A seek position at 2500 ms is expected at byte 40,000, and its block is searched at bytes
+    // 24,000 to 87,999; one at 1100 ms is expected at byte 17,600 and searched from byte 1600 on.
     const struct {
         const char *name;
         uint32_t ms;             // reported by the seek
-        int64_t landed;          // byte where the source really stands
+        int64_t landed;          // byte that the seek reaches
         positions copies;        // of its block, to these bytes
-        int64_t start;           // byte where the signal begins
+        int64_t start;           // first byte of the signal
         bool found = true;       // or decoded again
         int64_t bytes = kBytes;  // of the PCM
     } cases[] = {
         {"as expected", 2500, 40'000, {}, 40'000},
-        {"first place", 2500, 24'000 - kBlock, {}, 24'000 - kBlock},
+        {"first offset", 2500, 24'000 - kBlock, {}, 24'000 - kBlock},
         {"before it", 2500, 23'999 - kBlock, {}, 40'000, false},
-        {"last place", 2500, 87'999 - kBlock, {}, 87'999 - kBlock},
-        {"behind it", 2500, 88'000 - kBlock, {}, 40'000, false},
-        {"odd place", 2500, 50'001, {}, 50'001},
+        {"last offset", 2500, 87'999 - kBlock, {}, 87'999 - kBlock},
+        {"after it", 2500, 88'000 - kBlock, {}, 40'000, false},
+        {"odd offset", 2500, 50'001, {}, 50'001},
         {"the lowest in range", 2500, 40'000, {20'000, 30'001, 60'000}, 30'001 - kBlock},
         {"at the buffer's beginning", 1100, 17'600, {kBlock}, 0},
         {"not before it", 1100, 17'600, {kBlock - 1}, 17'600},
@@ -95,7 +95,7 @@ TEST_F(from_highlight, where_the_landing_point_is_found) {
     }
 }
 
-TEST_F(from_highlight, what_is_left) {
+TEST_F(FromHighlight, SecondDecodingReleasesTheFirst) {
     decode(stream);
     sources[0].land = 0;  // out of range
     EXPECT_EQ(tavo_get_from_here(&ctx, 15'000), 0);
@@ -104,7 +104,7 @@ TEST_F(from_highlight, what_is_left) {
     sources[0].report = kDuration;
     EXPECT_EQ(tavo_get_from_here(&ctx, 15'000), -2);
     EXPECT_EQ(hl.hl_pos, 20'000U);
-    // Failing: the probe, four segments' buffers, the PCM; then the conversion has its own.
+    // Allocations in order: the probe, four segment buffers, the PCM.
     for (int64_t nth = 0; nth < 6; ++nth) {
         decode(stream);
         sources[0].land = 0;
@@ -116,9 +116,9 @@ TEST_F(from_highlight, what_is_left) {
     }
 }
 
-// One record on the heap, of a plan of four: any other that is read is seen. It tells of 50,000
-// bytes of PCM, and with a duration of 0 of no number.
-TEST_F(from_highlight, comparison_reads_its_record_alone) {
+// The record is alone on the heap, so that a sanitizer sees a read of any other. It implies 50,000
+// bytes of PCM; a duration of 0 implies no size.
+TEST_F(FromHighlight, ComparisonReadsItsRecordAlone) {
     ASSERT_EQ(plan(kDuration, kRate, stream), 0);
     const auto seg = std::make_unique<TAVO_DECSEG>();
     seg->fmt.sample_rate = kRate;

@@ -31,12 +31,12 @@ signal_run averaged(int32_t source, int32_t target, int64_t first, int64_t n, co
     return slice(out, first, n);
 }
 
-TEST(resample_block, by_hand) {
+TEST(ResampleBlock, MeansOfBlocks) {
     // 32766.666015625: the spacing is 1/512 here.
     EXPECT_EQ(averaged(33075, 11025, 0, 2, {1, 0, 0, 32767, 32767, 32766}),
               (signal_run{0.3333333432674407958984375, 32766.666015625}));
     const sample_run in = {10, 20, 30, 40, 50};
-    // [4, 6) is cut to the last sample; [6, 8) lies beyond the end and takes it too.
+    // [4, 6) is cut to the last sample; [6, 8) is past the end and takes it too.
     EXPECT_EQ(averaged(2, 1, 0, 4, in), (signal_run{15, 35, 50, 50}));
     // Blocks [0, 0) [0, 1) [1, 1) [1, 2) [2, 2): an empty one is the sample that it names.
     EXPECT_EQ(averaged(1, 2, 0, 5, in), (signal_run{10, 10, 20, 20, 30}));
@@ -51,9 +51,9 @@ TEST(resample_block, by_hand) {
               (signal_run{1.66666662693023681640625, 3.5, 6}));
 }
 
-// Worked out from the windowed sinc's formula apart from this code in the precisions that it has
-// here; the sine may differ in its last bit. In the centre the cut-off over pi: 0.9 / 8.
-TEST(resample_sinc, filter_table) {
+// Expected values were computed independently from the formula of the windowed sinc, in the same
+// precisions; the sine may differ in its last bit. The centre is the cut-off over pi: 0.9 / 8.
+TEST(ResampleSinc, FilterTable) {
     for (const auto &[rate, phase, tap, want] : {std::tuple{48000, 0, 9, 0.20671874284744263},
                                                  {48000, 240, 0, -5.7826164265861735e-6},
                                                  {8000, 480, 4, -0.012936153449118137},
@@ -71,7 +71,7 @@ TEST(resample_sinc, filter_table) {
         EXPECT_EQ(prepared(source, target, -1)->taps, 0) << source;
 }
 
-// A filter by hand: 2 taps, coefficients a, b, c in the middle phase.
+// A filter of 2 taps with coefficients a, b, c in the middle phase.
 state_ptr three_taps(float a, float b, float c, float ratio = 1.0f) {
     auto state = std::make_unique<dorn_resampler_state>();
     state->taps = 2;
@@ -81,7 +81,7 @@ state_ptr three_taps(float a, float b, float c, float ratio = 1.0f) {
     return state;
 }
 
-// What a conversion writes, and its code.
+// The samples that a conversion writes, followed by its code.
 sample_run filtered(const state_ptr &state, const sample_run &in) {
     sample_run out(in.size(), 77);
     const int32_t code =
@@ -90,12 +90,12 @@ sample_run filtered(const state_ptr &state, const sample_run &in) {
     return out;
 }
 
-// Sums that no real filter gives; those, ends and channels go through fuzz/stages.cpp.
-TEST(resample_sinc, sums_by_hand) {
+// Sums that no real filter gives. fuzz/stages.cpp tests real ones, ends and channels.
+TEST(ResampleSinc, RoundsAndWrapsSums) {
     const auto all = [](int16_t sample, float a, float b, float c) {
         return slice(filtered(three_taps(a, b, c), sample_run(20, sample)), 1, 18);
     };
-    // Halves go up.
+    // Halves are rounded up.
     EXPECT_EQ(all(3, 0, 0.5f, 0), sample_run(17, 2));
     EXPECT_EQ(all(-3, 0, 0.5f, 0), sample_run(17, -1));
     // In tap order and in single precision, 2^24 + 1 stays 2^24.
@@ -105,7 +105,7 @@ TEST(resample_sinc, sums_by_hand) {
     EXPECT_EQ(all(5000, 0, 1e6f, 0), sample_run(17, -3584));
 }
 
-TEST(resample_sinc, bad_arguments_and_phases) {
+TEST(ResampleSinc, BadArgumentsAndPhases) {
     const sample_run in(100, 1);
     sample_run out(100);
     const auto state = prepared(48000);
@@ -132,7 +132,7 @@ TEST(resample_sinc, bad_arguments_and_phases) {
     free(silence);
 }
 
-TEST(resample_run, sizes_that_give_no_length) {
+TEST(ResampleRun, RefusesSizesWithoutALength) {
     const int16_t sample = 1;
     for (const auto &[bytes, source] :
          {std::pair<int64_t, int32_t>{INT64_MAX, 1}, {INT64_MAX / 8192, 1}, {2, 0}, {2, -48000}}) {
@@ -159,9 +159,9 @@ int32_t convert(TAVO_CTX *ctx) {
                             &ctx->ana_len, &ctx->ana);
 }
 
-// A job's conversion gives up the PCM, may use its memory, and has the bits of the other, which
-// fuzz/stages.cpp compares with the plain form.
-TEST(resample_run, song_becomes_the_same_signal) {
+// A job's conversion may use the memory of the PCM. fuzz/stages.cpp compares dorn_resampler_run
+// with a plain form.
+TEST(ResampleRun, InPlaceConversionIsBitIdentical) {
     const std::string bytes = noise(40'003, 5);
     for (const int32_t rate : {8000, 11025, 33075, 44100, 48000, 96000}) {
         for (const int64_t off : {0, 1, 4000, 40'001, 40'003}) {
@@ -172,7 +172,7 @@ TEST(resample_run, song_becomes_the_same_signal) {
             EXPECT_EQ(taken(ctx.ana, ctx.ana_len), converted(rest.data(), rest.size(), rate));
         }
     }
-    // Where single precision rounds the places, a block may be elsewhere than its output.
+    // Where single precision rounds positions, a block may be offset from its output.
     constexpr size_t kTail = 20'000;  // outputs
     const std::string tail = noise(kTail * 8 + 160, 6);
     TAVO_CTX ctx = with_pcm(((1 << 24) + kTail) * 8, 44100);
@@ -184,8 +184,8 @@ TEST(resample_run, song_becomes_the_same_signal) {
     free(ctx.ana);
 }
 
-// Of the first, second .. failing: e error, s silence, . none.
-TEST(resample_run, each_allocation_fails_in_turn) {
+// A letter for each failing allocation in turn: e error, s silence, . no effect.
+TEST(ResampleRun, EachAllocationFailsInTurn) {
     for (const auto &[rate, outcomes] :
          {std::pair{48000, "ee..."},  // state, 16-bit samples; memory that is not taken back
           {8000, ".ee.."},            // memory that cannot grow: the output has its own
