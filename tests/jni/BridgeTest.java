@@ -37,7 +37,7 @@ public final class BridgeTest {
 
     /** Keeps the event of one analysis, after a forbidden call; throws an exception. */
     private static final class Recorder implements TavoListener {
-        final CountDownLatch told = new CountDownLatch(1);
+        final CountDownLatch posted = new CountDownLatch(1);
         volatile String events = "";  // what deinit answered in each
         volatile int highlight;
         volatile int beats;
@@ -52,7 +52,7 @@ public final class BridgeTest {
         public void onFailure(Tavo tavo, int highlightMs) {
             highlight = highlightMs;
             events += tavo.deinit();
-            told.countDown();
+            posted.countDown();
             throw new IllegalStateException("thrown by a listener");
         }
     }
@@ -63,7 +63,7 @@ public final class BridgeTest {
         Tavo tavo = new Tavo(recorder);
         check(tavo.init(path, mode), 0, "init of " + path);
         check(tavo.analyze(0, 0, 0), 0, "analyze");
-        if (!stop) check(recorder.told.await(120, TimeUnit.SECONDS), true, "an event comes");
+        if (!stop) check(recorder.posted.await(120, TimeUnit.SECONDS), true, "an event comes");
         check(tavo.deinit(), 0, "deinit");
         check(recorder.events, "-1", "one event, with deinit inside");
         return recorder;

@@ -1,4 +1,4 @@
-"""The installed Python package, with real files. Arguments by environment: CMAKE, BUILD, SONGS."""
+"""The installed Python package, with real files. The environment has CMAKE, BUILD and SONGS."""
 import contextlib
 import functools
 import json
@@ -48,28 +48,28 @@ class Package(unittest.TestCase):
     def setUp(self):
         self.enterContext(contextlib.chdir(self.enterContext(tempfile.TemporaryDirectory())))
 
-    def same(self, result, told):
+    def same(self, result, line):
         self.assertEqual((result.path, result.highlight_ms, result.tempo_bpm, result.duration_s, result.sample_rate),
-                         (told["file"], told.get("hl_pos_ms"), told.get("bpm"), told["duration_ms"] / 1000,
-                          told["sample_rate"]))
+                         (line["file"], line.get("hl_pos_ms"), line.get("bpm"), line["duration_ms"] / 1000,
+                          line["sample_rate"]))
         self.assertEqual(result.beats.dtype, np.float64)
-        np.testing.assert_array_equal(result.beats, np.float32(told.get("beats_ms", [])).astype(np.float64) / 1000)
+        np.testing.assert_array_equal(result.beats, np.float32(line.get("beats_ms", [])).astype(np.float64) / 1000)
 
     def test_same_as_the_command(self):
         self.assertGreater(len(songs), 3)
         with ThreadPoolExecutor(3) as pool:  # which take turns
             for mode in ("highlight", "beats", "both"):
                 results = pool.map(functools.partial(tavo.analyze, mode=mode), songs)
-                for result, told in zip(results, by_command("--mode", mode, *songs), strict=True):
-                    self.same(result, told)
+                for result, line in zip(results, by_command("--mode", mode, *songs), strict=True):
+                    self.same(result, line)
         self.assertEqual(os.listdir(), [])  # no click track
 
     def test_arguments_reach_the_library(self):
-        (told,) = by_command("--length", "10", "--max-beats", "3", songs[0])
+        (line,) = by_command("--length", "10", "--max-beats", "3", songs[0])
         result = tavo.analyze(pathlib.Path(songs[0]), mode="both", length=10, max_beats=3)
-        self.same(result, told)
+        self.same(result, line)
         self.assertNotEqual(len(result.beats), len(tavo.analyze(songs[0]).beats))
-        self.same(next(tavo.analyze_many([songs[0]], "both", 10, 3)), told)
+        self.same(next(tavo.analyze_many([songs[0]], "both", 10, 3)), line)
         for wrong in ({"mode": "all"}, {"length": -1}, {"max_beats": 1 << 31}):
             with self.assertRaises(ValueError):
                 tavo.analyze(songs[0], **wrong)
@@ -129,8 +129,8 @@ class Package(unittest.TestCase):
         self.assertEqual([end.path for end in (first, broken, same, other)], [os.fsdecode(path) for path in paths])
         self.assertIsInstance(broken, tavo.TavoError)
         np.testing.assert_array_equal(first.beats, same.beats)
-        for result, told in zip((first, other), by_command(*songs[:2]), strict=True):
-            self.same(result, told)
+        for result, line in zip((first, other), by_command(*songs[:2]), strict=True):
+            self.same(result, line)
         next(tavo.analyze_many(songs)).path  # left early: the command ends too
 
     def test_module_is_the_command(self):
