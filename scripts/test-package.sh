@@ -61,11 +61,14 @@ cp "${tar[0]}" "$root/try/tavo.tar.gz"
 # Two hits a second, loud from 15 s on.
 ffmpeg -v error -f lavfi -i \
   'aevalsrc=sin(2*PI*220*t)*(0.1+0.6*gt(t\,15))*exp(-8*mod(t\,0.5)):d=40:s=44100' "$root/try/song.flac"
-expected=$(cd "$root/try" && "$tree/bin/tavo" --format json --length 20 song.flac)
+without_time() { # the result without the processor time, which differs
+  sed -E 's/,?"[a-z_]*cpu[a-z_]*":[0-9.]+//'
+}
+expected=$(cd "$root/try" && "$tree/bin/tavo" --format json --length 20 song.flac | without_time)
 [[ $expected == *'"status":"ok"'* ]] || fail "the build gives $expected"
 same() { # same COMMAND: its result is the build's
   local got
-  got=$(inside sh -c "cd /try && $1 --format json --length 20 song.flac")
+  got=$(inside sh -c "cd /try && $1 --format json --length 20 song.flac" | without_time)
   [[ $got == "$expected" ]] || fail "$1 gives $got instead of $expected"
   echo "$1: the build's result"
 }
@@ -79,7 +82,7 @@ same "python3 -m tavo"
 inside python3 -c "import tavo; print(tavo.__version__, tavo.analyze('/try/song.flac', length=20).highlight_ms)"
 inside java -Djava.library.path="/usr/lib/$(dpkg-architecture -qDEB_HOST_MULTIARCH)" -jar /usr/share/java/tavo.jar \
   --length 20 /try/song.flac
-for file in /usr/share/man/man1/tavo.1 /usr/share/bash-completion/completions/tavo; do
+for file in /usr/share/man/man1/tavo.1.gz /usr/share/bash-completion/completions/tavo; do
   [[ -s $root$file ]] || fail "$file is missing"
 done
 cache=$(inside ldconfig -p)
@@ -93,7 +96,7 @@ inside sh -c 'cc /usr/share/doc/tavo-doc/examples/analyze_file.c -o /try/analyze
 lines=$(inside /try/analyze_file /try/song.flac 20)
 highlight=${expected#*'"hl_pos_ms":'}
 highlight=${highlight%%,*}
-[[ $(head -n 1 <<<"$lines") == "highlight $highlight" ]] || fail "the example prints $lines"
+grep -qx "highlight $highlight" <<<"$lines" || fail "the example prints $lines"
 echo "analyze_file: highlight $highlight, $(grep -c '^beat ' <<<"$lines") beats"
 
 [[ -n $(traces) ]] || fail "a removal would not be seen"
@@ -111,7 +114,7 @@ python=/usr/bin/python3
 "$python" -m pip wheel --quiet --no-index --no-build-isolation --no-deps --wheel-dir "$build/wheel" ./python
 "$python" -m venv --system-site-packages "$build/venv" # NumPy is Debian's
 "$build/venv/bin/pip" install --quiet --no-index "$build"/wheel/tavo-*-py3-none-linux_*.whl
-got=$(cd "$root/try" && "$build/venv/bin/tavo" --format json --length 20 song.flac)
+got=$(cd "$root/try" && "$build/venv/bin/tavo" --format json --length 20 song.flac | without_time)
 [[ $got == "$expected" ]] || fail "the wheel gives $got instead of $expected"
 (cd / && "$build/venv/bin/python" -c 'import sys, tavo; print(tavo.__file__, tavo.analyze(sys.argv[1]).highlight_ms)' \
   "$root/try/song.flac")
