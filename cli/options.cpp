@@ -10,6 +10,7 @@
 #include <sstream>
 
 #include "cli/input/ffmpeg_process.h"
+#include "cli/write/format.h"
 #include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"
@@ -38,13 +39,7 @@ constexpr const char *kFooter =
     "music from the highlight on.\n"
     "\n"
     "Exit status: 0 all done; 1 a file failed; 2 wrong usage; 130 stopped with\n"
-    "Ctrl-C; 141 the reader of the results has gone.\n"
-    "\n"
-    "Examples:\n"
-    "  tavo song.wav                    a summary for people\n"
-    "  tavo -f json -r -j 2 Music       one JSON object a line for each file\n"
-    "  find . -name '*.flac' -print0 | tavo -0 -f csv -\n"
-    "  tavo -f labels -l 30 song.wav    song.wav.labels.txt, for Audacity\n";
+    "Ctrl-C; 141 the reader of the results has gone.\n";
 
 constexpr size_t kOptionColumns = 28;
 constexpr size_t kTextColumns = 80 - kOptionColumns;
@@ -62,6 +57,55 @@ std::string wrapped(const std::string &text) {
     return out;
 }
 
+constexpr const char *kUsage = "Usage: tavo [OPTION]... FILE...\n";
+
+constexpr const char *kExamples =
+    "Examples:\n"
+    "  tavo song.mp3                       a summary for people\n"
+    "  tavo -f labels -l 30 song.mp3       song.mp3.labels.txt, for Audacity\n"
+    "  tavo -f json -r -j 2 Music          one JSON object a line for each file\n"
+    "  tavo --report song.html song.mp3    a page that shows and plays the song\n"
+    "  find . -name '*.flac' -print0 | tavo -0 -f csv -\n";
+
+constexpr const char *kOtherGroup = "Others";
+
+// Puts the options that were declared since the last call into a group of the help.
+void group_options(CLI::App &app, const char *group) {
+    for (CLI::Option *option : app.get_options()) {
+        if (option->get_group() == "Options") option->group(group);
+    }
+}
+
+// The names of a group's options in lines of a terminal's width.
+std::string group_lines(const CLI::App &app, const std::string &group) {
+    constexpr size_t kColumns = 80;
+    constexpr size_t kIndent = 13;
+    std::string line = "  " + group + std::string(kIndent - 2 - group.size(), ' ');
+    std::string lines;
+    bool is_first = true;
+    for (const CLI::Option *option : app.get_options()) {
+        if (option->get_group() != group) continue;
+        std::string name = option->get_name(option->get_positional(), true);
+        std::replace(name.begin(), name.end(), ',', ' ');
+        if (!option->get_type_name().empty()) name += " " + option->get_type_name();
+        if (line.size() + 2 + name.size() > kColumns) {
+            lines += line + ",\n";
+            line = std::string(kIndent, ' ');
+            is_first = true;
+        }
+        line += (is_first ? "" : ", ") + name;
+        is_first = false;
+    }
+    return lines + line + "\n";
+}
+
+std::string short_help(const CLI::App &app) {
+    std::string text =
+        std::string(kUsage) + kAbout + "\n\n" + kExamples + "\nOptions, which --help explains:\n";
+    for (const std::string &group : app.get_groups()) text += group_lines(app, group);
+    return text;
+}
+
 int wrong_usage(const std::string &sentence) {
     fprintf(stderr, "tavo: %s\nTry 'tavo --help'.\n", sentence.c_str());
     return kExitUsage;
@@ -77,10 +121,11 @@ constexpr format_word kFormats[] = {
     {"csv", result_format::csv},
     {"labels", result_format::labels},
     {"kdenlive", result_format::kdenlive},
-    {"losslesscut", result_format::losslesscut},
+    {"llc", result_format::llc},
     {"ffmetadata", result_format::ffmetadata},
     {"edl", result_format::edl},
     {"fcpxml", result_format::fcpxml},
+    {"otio", result_format::otio},
     {"reaper", result_format::reaper},
 };
 
@@ -166,15 +211,19 @@ void declare_output(CLI::App &app, options &out, raw_values &raw) {
     app.add_option("-f,--format", raw.format,
                    "text (default) for people, json: one object a line, csv: one row a file; or "
                    "markers for an editor, a file beside each input: labels (Audacity), kdenlive, "
-                   "losslesscut, ffmetadata (chapters), edl (DaVinci Resolve), fcpxml, reaper. "
-                   "Markers span 30 s of highlight without --length")
+                   "llc (LosslessCut), ffmetadata (chapters), edl (DaVinci Resolve), fcpxml, otio, "
+                   "reaper. Markers span 30 s of highlight without --length")
         ->check(CLI::IsMember(format_words()).description(""))
         ->type_name("FORMAT");
+    app.add_option("--print", out.print,
+                   "Write this text for each song, with {file}, {stem}, {hl_s}, {hl_ms}, {end_s}, "
+                   "{bpm} and {beats} replaced, \\n and \\t for a line's end and a tab")
+        ->type_name("TEXT");
     app.add_option("-o,--output-dir", out.output_dir,
                    "Folder for the marker files; by default they are written beside each file")
         ->type_name("DIR");
     app.add_option("--fps", raw.fps,
-                   "Frames a second for edl and fcpxml: 23.976, 24, 25, 29.97, 29.97df "
+                   "Frames a second for edl, fcpxml and otio: 23.976, 24, 25, 29.97, 29.97df "
                    "(drop-frame), 30 (default), 50, 59.94, 59.94df, 60")
         ->check(CLI::IsMember(frame_rate_names()).description(""))
         ->type_name("RATE");
@@ -185,12 +234,15 @@ void declare_output(CLI::App &app, options &out, raw_values &raw) {
                    "highlight on in "
                    "mode both; one input only")
         ->type_name("WAV");
+    app.add_flag("-q,--quiet", out.quiet, "No progress bar and no notes");
+}
+
+void declare_page(CLI::App &app, options &out) {
     app.add_option("--report", out.report,
                    "Write a page that shows and plays the song, an HTML file; for several inputs "
                    "an index, the pages in a folder beside it")
         ->type_name("HTML");
     app.add_flag("--embed", out.embed, "Put the sound into the page");
-    app.add_flag("-q,--quiet", out.quiet, "No progress bar and no notes");
 }
 
 void declare_catalogue(CLI::App &app, options &out, raw_values &raw) {
@@ -238,8 +290,9 @@ void set_values(const raw_values &raw, options &out) {
     for (const format_word &entry : kFormats) {
         if (raw.format == entry.word) out.format = entry.format;
     }
+    if (!out.print.empty()) out.format = result_format::print;
     if (!raw.fps.empty()) out.fps = raw.fps;
-    for (std::string *path : {&out.click, &out.report, &out.store}) {
+    for (std::string *path : {&out.click, &out.report, &out.store, &out.print}) {
         unshield(*path);
     }
     unshield(out.output_dir);
@@ -281,9 +334,12 @@ std::string contradiction(const options &out, const raw_values &raw) {
         return "--output-dir goes with the formats that write files, like --format labels.";
     }
     if (!raw.fps.empty() && out.format != result_format::edl &&
-        out.format != result_format::fcpxml) {
-        return "--fps goes with --format edl and fcpxml, which count in frames.";
+        out.format != result_format::fcpxml && out.format != result_format::otio) {
+        return "--fps goes with --format edl, fcpxml and otio, which count in frames.";
     }
+    if (!out.print.empty() && !raw.format.empty()) return "--print takes the place of --format.";
+    std::string sample;
+    if (const failure wrong = fill_template(out.print, {}, sample)) return wrong.sentence;
     if (out.skip_existing && !writes_files(out.format)) {
         return "--skip-existing goes with the formats that write files, like --format labels.";
     }
@@ -315,28 +371,46 @@ void write_notes(const options &out) {
     }
 }
 
+// The exit status after help or the version.
+int end_of_help() {
+    if (std::cout.flush()) return kExitOk;
+    perror("tavo: the output cannot be written");
+    return kExitFailed;
+}
+
 }  // namespace
 
 std::optional<int> parse_options(int argc, char **argv, options &out) {
     CLI::App app(kAbout, "tavo");
-    app.footer(kFooter);
+    app.footer(std::string(kFooter) + "\n" + kExamples);
+    app.set_help_flag();
     app.get_formatter()->column_width(kOptionColumns);
-    app.set_version_flag("--version", std::string("tavo ") + TAVO_VERSION);
     raw_values raw;
     declare_inputs(app, out, raw);
+    group_options(app, "Input");
     declare_analysis(app, out, raw);
+    group_options(app, "Analysis");
     declare_output(app, out, raw);
+    group_options(app, "Output");
+    declare_page(app, out);
+    group_options(app, "Page");
     declare_catalogue(app, out, raw);
+    group_options(app, "Catalogue");
+    app.set_help_flag("-h", "The options by name");
+    app.set_help_all_flag("--help", "This help");
+    app.set_version_flag("--version", std::string("tavo ") + TAVO_VERSION, "Print the version");
+    group_options(app, kOtherGroup);
     for (CLI::Option *option : app.get_options()) {
         option->description(wrapped(option->get_description()));
     }
     try {
         app.parse(shielded(argc, argv));
+    } catch (const CLI::CallForHelp &) {
+        std::cout << short_help(app);
+        return end_of_help();
     } catch (const CLI::Success &done) {
-        const int status = app.exit(done) == 0 ? kExitOk : kExitUsage;
-        if (std::cout.flush()) return status;
-        perror("tavo: the output cannot be written");
-        return kExitFailed;
+        app.exit(done);
+        return end_of_help();
     } catch (const CLI::ParseError &wrong) {
         return wrong_usage(wrong.what());
     }

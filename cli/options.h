@@ -14,13 +14,15 @@ enum class result_format {
     text,
     json,
     csv,
+    print,  // --print
     // marker files
     labels,
     kdenlive,
-    losslesscut,
+    llc,
     ffmetadata,
     edl,
     fcpxml,
+    otio,
     reaper,
 };
 
@@ -30,6 +32,7 @@ struct options {
     int32_t max_beats = 0;      // 0 for no limit
     int32_t max_minutes = 600;  // longer audio is refused
     result_format format = result_format::text;
+    std::string print;       // template of the format print
     std::string click;       // where the click track goes, empty for none
     std::string report;      // where the page goes, empty for none
     bool embed = false;      // the sound goes into the page

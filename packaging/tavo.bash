@@ -17,18 +17,18 @@ _tavo() {
     case $before in
         -m | --mode) mapfile -t COMPREPLY < <(compgen -W 'highlight beats both' -- "$word") ;;
         -f | --format) mapfile -t COMPREPLY < <(compgen -W 'text json csv labels kdenlive
-            losslesscut ffmetadata edl fcpxml reaper' -- "$word") ;;
+            llc ffmetadata edl fcpxml otio reaper' -- "$word") ;;
         --fps) mapfile -t COMPREPLY < <(compgen -W '23.976 24 25 29.97 29.97df 30 50 59.94
             59.94df 60' -- "$word") ;;
         --shard) mapfile -t COMPREPLY < <(compgen -W 'auto' -- "$word") ;;
         -o | --output-dir) mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
-        -l | --length | -j | --jobs | --max-beats | --max-minutes | --patience | --timeout) ;; # a number
+        -l | --length | -j | --jobs | --max-beats | --max-minutes | --print | --patience | --timeout) ;; # a number
         --click | --report | --files-from | --store) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
         *)
             if [[ $word == -* ]]; then
                 mapfile -t COMPREPLY < <(compgen -W '-h --help --version
                     -m --mode -l --length --max-beats --max-minutes -j --jobs --timeout --no-ffmpeg
-                    -f --format -o --output-dir --fps --force --skip-existing --click --report --embed -q --quiet
+                    -f --format --print -o --output-dir --fps --force --skip-existing --click --report --embed -q --quiet
                     -r --recursive --files-from -0 --null
                     --store --retry-failed --redo --from-store --failed --patience --shard' -- "$word")
             else

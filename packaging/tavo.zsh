@@ -1,7 +1,8 @@
 #compdef tavo
 # Completion of the command tavo for zsh.
 _arguments -s -S \
-  '(-h --help)'{-h,--help}'[print the options and end]' \
+  '-h[print the names of the options and end]' \
+  '--help[explain the options and end]' \
   '--version[print the version and end]' \
   '(-m --mode)'{-m+,--mode=}'[what to find]:mode:(highlight beats both)' \
   '(-l --length)'{-l+,--length=}'[length of the highlight wanted]:seconds:' \
@@ -10,8 +11,9 @@ _arguments -s -S \
   '(-j --jobs)'{-j+,--jobs=}'[files analysed at once]:number:' \
   '--timeout=[give up a file whose analysis takes longer]:number:' \
   '--no-ffmpeg[decode nothing with the ffmpeg program]' \
-  '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive losslesscut ffmetadata edl fcpxml reaper)' \
+  '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive llc ffmetadata edl fcpxml otio reaper)' \
   '(-o --output-dir)'{-o+,--output-dir=}'[folder for the marker files]:folder:_files -/' \
+  '--print=[write this text for each song]:text:' \
   '--fps=[frames a second for edl and fcpxml]:rate:(23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60)' \
   '--force[overwrite files that exist]' \
   '--skip-existing[leave out inputs whose marker file exists]' \

@@ -131,7 +131,7 @@ std::string encoded_answer(const request &asked, const options &opts, int stop_f
 reply make_reply(const record &result, const options &opts) {
     reply out;
     out.status = result.status;
-    out.result = format_record(opts.format, result);
+    out.result = format_record(opts, result);
     const std::string line = shown(result.file) + ": " + result.error + "\n";
     if (opts.failed) {  // a failure that the store holds is a result here
         out.status = outcome::ok;

@@ -5,8 +5,10 @@
 #include <climits>
 #include <cstdint>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <iterator>
+#include <memory>
 
 namespace {
 
@@ -148,6 +150,16 @@ std::string percent_encoded(const std::string &bytes) {
 std::string base_name(const std::string &path) {
     const size_t slash = path.rfind('/');
     return slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+std::string stem(const std::string &name) {
+    const size_t period = name.rfind('.');
+    return period == 0 ? name : name.substr(0, period);
+}
+
+std::string file_url(const std::string &path) {
+    const std::unique_ptr<char, decltype(&free)> whole(realpath(path.c_str(), nullptr), free);
+    return "file://" + percent_encoded(whole == nullptr ? path : whole.get());
 }
 
 std::string fitting_name(const std::string &name, const std::string &suffix) {

@@ -21,6 +21,12 @@ std::string percent_encoded(const std::string &bytes);
 
 std::string base_name(const std::string &path);
 
+// name without the ending after its last period.
+std::string stem(const std::string &name);
+
+// The absolute path with its links resolved, as a URL.
+std::string file_url(const std::string &path);
+
 // name and suffix as one file's name. One that would get too long for a file system ends in a
 // number made from the whole name instead.
 std::string fitting_name(const std::string &name, const std::string &suffix);

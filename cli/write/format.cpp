@@ -6,8 +6,9 @@ std::string format_head(result_format format) {
     return format == result_format::csv ? csv_head() : "";
 }
 
-std::string format_record(result_format format, const record &result) {
-    switch (format) {
+std::string format_record(const options &opts, const record &result) {
+    std::string filled;
+    switch (opts.format) {
         case result_format::none:
             return "";
         case result_format::text:
@@ -16,6 +17,10 @@ std::string format_record(result_format format, const record &result) {
             return json_record(result);
         case result_format::csv:
             return csv_record(result);
+        case result_format::print:
+            if (result.status != outcome::ok) return "";
+            // The template was checked with the options.
+            return fill_template(opts.print, result, filled) ? "" : filled;
         default:  // marker files: the name of the file written
             return result.written.empty() ? "" : shown(result.written) + "\n";
     }

@@ -4,6 +4,7 @@
 
 #include <string>
 
+#include "cli/failure.h"
 #include "cli/options.h"
 #include "cli/run/record.h"
 
@@ -11,7 +12,11 @@
 std::string format_head(result_format format);
 
 // One record; empty when the format has nothing to say about it on standard output.
-std::string format_record(result_format format, const record &result);
+std::string format_record(const options &opts, const record &result);
+
+// Appends the text with each {field} replaced, and with \n, \t and other escaped characters. Fails
+// for an unknown field.
+failure fill_template(const std::string &text, const record &result, std::string &filled);
 
 std::string text_record(const record &result);
 std::string json_record(const record &result);

@@ -10,16 +10,17 @@ namespace {
 
 struct marker_format {
     result_format format;
-    const char *suffix;  // of the file's name
+    const char *suffix;  // of the file's name, after the song's
     std::string (*content)(const record &result, const options &opts);
 };
 constexpr marker_format kMarkerFormats[] = {
     {result_format::labels, ".labels.txt", audacity_labels},
     {result_format::kdenlive, ".guides.txt", kdenlive_guides},
-    {result_format::losslesscut, ".losslesscut.csv", losslesscut_segments},
+    {result_format::llc, "-proj.llc", losslesscut_project},
     {result_format::ffmetadata, ".ffmetadata.txt", ffmetadata_chapters},
     {result_format::edl, ".edl", edl_markers},
     {result_format::fcpxml, ".fcpxml", fcpxml_markers},
+    {result_format::otio, ".otio", otio_timeline},
     {result_format::reaper, ".reaper.csv", reaper_markers},
 };
 constexpr int32_t kUsualLengthSeconds = 30;  // marked without --length: a preview's
@@ -42,7 +43,9 @@ std::string marker_path(const std::string &input, const options &opts) {
     const std::string folder = opts.output_dir.empty()
                                    ? input.substr(0, input.size() - name.size())
                                    : opts.output_dir + (opts.output_dir.back() == '/' ? "" : "/");
-    return folder + fitting_name(name, find_format(opts.format)->suffix);
+    // LosslessCut finds a project by the song's name without its ending.
+    const std::string song = opts.format == result_format::llc ? stem(name) : name;
+    return folder + fitting_name(song, find_format(opts.format)->suffix);
 }
 
 std::string marker_content(const record &result, const options &opts) {

@@ -36,10 +36,11 @@ std::string marker_content(const record &result, const options &opts);
 // The writers.
 std::string audacity_labels(const record &result, const options &opts);
 std::string kdenlive_guides(const record &result, const options &opts);
-std::string losslesscut_segments(const record &result, const options &opts);
+std::string losslesscut_project(const record &result, const options &opts);
 std::string reaper_markers(const record &result, const options &opts);
 std::string ffmetadata_chapters(const record &result, const options &opts);
 std::string edl_markers(const record &result, const options &opts);
 std::string fcpxml_markers(const record &result, const options &opts);
+std::string otio_timeline(const record &result, const options &opts);
 
 #endif

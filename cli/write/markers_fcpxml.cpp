@@ -1,7 +1,5 @@
 // Final Cut Pro's XML, version 1.8: a project with the song as its only clip, and markers on it.
 #include <algorithm>
-#include <cstdlib>
-#include <memory>
 
 #include "cli/write/file_names.h"
 #include "cli/write/frame_rate.h"
@@ -13,11 +11,6 @@ namespace {
 // A whole number of frames as a fraction of seconds.
 std::string frames_text(int64_t frames, const frame_rate &rate) {
     return std::to_string(frames * rate.seconds) + "/" + std::to_string(rate.frames) + "s";
-}
-
-std::string file_url(const std::string &path) {
-    const std::unique_ptr<char, decltype(&free)> whole(realpath(path.c_str(), nullptr), free);
-    return "file://" + percent_encoded(whole == nullptr ? path : whole.get());
 }
 
 }  // namespace

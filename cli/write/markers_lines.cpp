@@ -1,8 +1,10 @@
-// Formats with a line for each mark.
+// Formats with a line or an object for each mark.
 #include <array>
 #include <cmath>
 #include <cstdio>
+#include <nlohmann/json.hpp>
 
+#include "cli/write/file_names.h"
 #include "cli/write/markers.h"
 
 namespace {
@@ -44,9 +46,9 @@ std::string kdenlive_guides(const record &result, const options & /*opts*/) {
 }
 
 // Segments: the highlight, then what lies between a beat and the next or the end of the song.
-std::string losslesscut_segments(const record &result, const options & /*opts*/) {
+std::string losslesscut_project(const record &result, const options & /*opts*/) {
     const std::vector<mark> marks = marks_of(result);
-    std::string out;
+    nlohmann::ordered_json segments = nlohmann::ordered_json::array();
     for (size_t i = 0; i < marks.size(); ++i) {
         double end_ms = marks[i].end_ms;
         if (end_ms <= marks[i].start_ms) {
@@ -55,10 +57,14 @@ std::string losslesscut_segments(const record &result, const options & /*opts*/)
                          : player_ms(result, static_cast<double>(result.duration_ms));
         }
         if (end_ms <= marks[i].start_ms) continue;  // two beats at one time
-        out +=
-            seconds(marks[i].start_ms, 3) + "," + seconds(end_ms, 3) + "," + marks[i].name + "\n";
+        segments.push_back({{"start", std::round(marks[i].start_ms) / 1000.0},
+                            {"end", std::round(end_ms) / 1000.0},
+                            {"name", marks[i].name}});
     }
-    return out;
+    const nlohmann::ordered_json project = {{"version", 1},
+                                            {"mediaFileName", as_utf8(base_name(result.file))},
+                                            {"cutSegments", segments}};
+    return project.dump(2) + "\n";
 }
 
 // The table of the region and marker manager.

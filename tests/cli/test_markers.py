@@ -1,13 +1,16 @@
 """Marker files, read by other programs or by rules that the editors publish."""
 import csv
 import json
+import os
+import pathlib
 import re
 import subprocess
 import urllib.parse
 import xml.etree.ElementTree as ElementTree
 
-from command_case import Case, seconds, song, standard_song
+from command_case import TAVO, Case, seconds, song, standard_song
 
+EDITORS = pathlib.Path(__file__).parents[2] / "docs/EDITORS.md"
 NAME = "a<b>&\"c\" é.wav"  # as hard as a name can be for XML and for a URL
 FPS = {  # frames a second, numbers a second in the timecode, numbers dropped a minute
     "23.976": (24000 / 1001, 24, 0), "24": (24, 24, 0), "25": (25, 25, 0), "29.97": (30000 / 1001, 30, 0),
@@ -82,8 +85,11 @@ class Markers(Case):
             self.assertEqual([r["#"] for r in rows], regions + [f"M{i + 1}" for i in range(len(rows) - len(regions))])
             self.assert_marks([(seconds(r["Length"] or "0"), r["Name"]) for r in rows],
                               [(end - start, name) for start, end, name in marks], 0.002)
-        path, marks = self.write("losslesscut", "--length 12")
-        segments = [(float(a), float(b), name) for a, b, name in csv.reader(path.read_text().splitlines())]
+        path, marks = self.write("llc", "--length 12")
+        self.assertEqual(path.name, NAME[:-4] + "-proj.llc")
+        project = json.loads(path.read_text())
+        self.assertEqual((project["version"], project["mediaFileName"]), (1, NAME))
+        segments = [(cut["start"], cut["end"], cut["name"]) for cut in project["cutSegments"]]
         self.assert_marks(segments, marks[:1] + until_next([(m[0], m[2]) for m in marks[1:]], self.end))
 
     def test_chapters(self):
@@ -110,6 +116,35 @@ class Markers(Case):
             self.assert_marks([(number[start] / rate, name) for _, start, _, name in events],
                               [(m[0], m[2]) for m in marks], 0.501 / rate)
             self.assertTrue(all(number[end] == number[start] + 1 for _, start, end, _ in events))
+
+    def test_otio(self):
+        path, marks = self.write("otio", "--length 12", "--fps 29.97")
+        time_line = json.loads(path.read_text())
+        (clip,) = time_line["tracks"]["children"][0]["children"]
+        self.assertEqual((time_line["OTIO_SCHEMA"], clip["OTIO_SCHEMA"], clip["name"]), ("Timeline.1", "Clip.1", NAME))
+        self.assertEqual(urllib.parse.unquote(clip["media_reference"]["target_url"]), f"file://{self.folder / NAME}")
+
+        def at(time):
+            self.assertEqual(time["OTIO_SCHEMA"], "RationalTime.1")
+            return time["value"] / time["rate"]
+        found = [(at(m["marked_range"]["start_time"]), at(m["marked_range"]["duration"]), m["name"])
+                 for m in clip["markers"]]
+        self.assert_marks(found, [(a, b - a, name) for a, b, name in marks], 1.001 / 29.97)
+
+    def test_recipes(self):
+        """The commands of the guide, in a shell."""
+        subprocess.run(["lame", "--quiet", standard_song(), self.folder / "song.mp3"], check=True)
+        (result,) = self.run_json("song.mp3")
+        start = f"{(result['hl_pos_ms'] - result['offset_ms']) / 1000:.3f}"
+        recipes = re.findall(r"^\$ (tavo .*--print .*)$", EDITORS.read_text(), re.MULTILINE)
+        printed = [subprocess.run(["bash", "-c", recipe], check=True, capture_output=True, text=True, cwd=self.folder,
+                                  env={**os.environ, "PATH": f"{os.path.dirname(TAVO)}:{os.environ['PATH']}"}).stdout
+                   for recipe in recipes]
+        self.assertEqual(printed[0], f"#TITLE:song\n#MP3:song.mp3\n#PREVIEWSTART:{start}\n")
+        self.assertRegex(printed[1], r"^#TITLE:song;\n#SAMPLESTART:\d+\.\d{3};\n#SAMPLELENGTH:15\.000;\n$")
+        self.assertRegex(printed[2], r"^beet modify -y 'path:song\.mp3' bpm=\d+\n$")
+        self.assertRegex(printed[3], r"^#EXTVLCOPT:start-time=[\d.]+\n#EXTVLCOPT:stop-time=[\d.]+\nsong\.mp3\n$")
+        self.assertEqual(len(printed), 4)
 
     def test_fcpxml(self):
         for fps in ("29.97df", "25"):

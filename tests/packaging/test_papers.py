@@ -42,6 +42,13 @@ class Papers(unittest.TestCase):
         run("zsh", "-n", ZSH)
         self.assertEqual(set(OPTION.findall(re.sub(r"_arguments.*|\[.*?\]", "", ZSH.read_text()))), expected)
 
+    def test_short_help(self):
+        """One screen that names every option."""
+        lines = run(TAVO, "-h").stdout.splitlines()
+        self.assertLessEqual((len(lines), max(map(len, lines))), (24, 80))
+        named = set(OPTION.findall("\n".join(line for line in lines[lines.index("Examples:") + 6:])))
+        self.assertEqual(named, set(complete("-")))
+
     def test_choices(self):
         """What is completed for an option's value is what the option takes."""
         for option in ("--mode", "--format", "--fps"):
