@@ -9,6 +9,8 @@
 #include <atomic>
 #include <cstdarg>
 #include <cstdio>
+#include <cstdlib>
+#include <cstring>
 #include <functional>
 #include <mutex>
 #include <optional>
@@ -45,8 +47,7 @@ struct {
 std::mutex lock;  // guards events and lines
 
 const std::thread::id own_thread = std::this_thread::get_id();
-std::string characters;    // there is one string,
-std::vector<float> array;  // and one array at a time
+std::vector<float> array;  // there is one array at a time
 
 // At the beginning of each call that may fail.
 bool fails(const std::string &function) {
@@ -85,14 +86,14 @@ JNINativeInterface_ functions() {
                                method == "postEventFromNative(Ljava/lang/Object;III[F)V");
     };
     table.NewGlobalRef = [](JNIEnv *, jobject) { return give("NewGlobalRef", &global_references); };
-    // A string is its characters, which are gone with their release.
-    table.GetStringUTFChars = [](JNIEnv *, jstring string, jboolean *) {
-        characters = reinterpret_cast<const char *>(string);
-        return give("GetStringUTFChars", &lent) != nullptr ? characters.c_str() : nullptr;
+    // A string is its characters; each release ends one copy.
+    table.GetStringUTFChars = [](JNIEnv *, jstring string, jboolean *) -> const char * {
+        const char *characters = reinterpret_cast<const char *>(string);
+        return give("GetStringUTFChars", &lent) != nullptr ? strdup(characters) : nullptr;
     };
-    table.ReleaseStringUTFChars = [](JNIEnv *, jstring, const char *) {
+    table.ReleaseStringUTFChars = [](JNIEnv *, jstring, const char *characters) {
         fails("ReleaseStringUTFChars");
-        characters.clear();
+        free(const_cast<char *>(characters));
         --lent;
     };
     table.NewFloatArray = [](JNIEnv *, jsize length) {
