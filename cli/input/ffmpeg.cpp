@@ -2,6 +2,7 @@
 
 #include <strings.h>
 #include <sys/mman.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -9,13 +10,18 @@
 
 #include "cli/input/ffmpeg_process.h"
 #include "cli/write/value_text.h"
-#include "common/limits.h"
+#include "include/tavo.h"
 
 namespace {
 
 constexpr size_t kRateOffset = 24;                            // of a WAV header
 constexpr size_t kHeaderBytes = 44;                           // of ffmpeg's, without tags
 constexpr int64_t kMostWavBytes = (int64_t{1} << 32) - 4096;  // a WAV file has 32-bit sizes
+
+// Sound that a file may decode to: a minute, and so many samples for each of its bytes. Silence has
+// about a thousand in the most compact codecs; a time stamp hours ahead would have billions.
+constexpr int64_t kMostSamplesPerByte = 2048;
+constexpr int64_t kSpareSeconds = 60;
 
 constexpr const char *kMediaSuffixes[] = {
     ".3gp", ".ac3", ".aif", ".aifc", ".aiff", ".amr",  ".ape", ".au",   ".avi",
@@ -27,6 +33,7 @@ constexpr const char *kMediaSuffixes[] = {
 struct decoding {
     int fd;
     int64_t most_minutes;
+    int64_t file_bytes;  // of the encoded file
     std::string header;  // its first kHeaderBytes
     int64_t bytes = 0;   // written to fd
     int32_t rate = 0;    // Hz; 0 until the header is there
@@ -53,15 +60,26 @@ failure store_sound(decoding &sound, const char *data, size_t size) {
         sound.header.append(data, std::min(size, kHeaderBytes - sound.header.size()));
         if (sound.header.size() < kHeaderBytes) return {};
         sound.rate = rate_of(sound.header);
-        if (sound.rate < kMinRate || sound.rate > kMaxRate) {
+        if (sound.rate < TAVO_MIN_RATE || sound.rate > TAVO_MAX_RATE) {
             return {"ffmpeg decodes it at " + std::to_string(sound.rate) +
                     " Hz, which is not read."};
         }
     }
-    if (sound.bytes > std::min(sound.most_minutes * 60 * 2 * sound.rate, kMostWavBytes)) {
+    const int64_t samples = sound.bytes / 2;
+    if (samples > sound.most_minutes * 60 * sound.rate || sound.bytes > kMostWavBytes) {
         return {"The audio is longer than " + std::to_string(sound.most_minutes) + " minutes."};
     }
+    if (samples / kMostSamplesPerByte >
+        sound.file_bytes + kSpareSeconds * sound.rate / kMostSamplesPerByte) {
+        return {"The audio is longer than a file of its size can hold."};
+    }
     return {};
+}
+
+int64_t size_of_file(const std::string &path, int fd) {
+    struct stat info {};
+    const int code = fd >= 0 ? fstat(fd, &info) : stat(path.c_str(), &info);
+    return code == 0 ? info.st_size : 0;
 }
 
 // Players start their time line at 0 and play gaps as silence: so does the filter. Without tags the
@@ -100,11 +118,12 @@ failure decode_with_ffmpeg(const ffmpeg_limits &limits, const std::string &path,
                            int stop_fd, int &sound_fd) {
     sound_fd = memfd_create("sound", MFD_CLOEXEC);
     if (sound_fd < 0) return {system_sentence("The decoded sound cannot be held in memory", errno)};
-    decoding sound{sound_fd, limits.minutes, "", 0, 0};
+    const int64_t file_bytes = size_of_file(path, fd);
+    decoding sound{sound_fd, limits.minutes, file_bytes, "", 0, 0};
     failure failed = decode_once({limits.program, path, fd, wav_output(0)}, stop_fd, sound);
-    const int32_t accepted = std::clamp(sound.rate, kMinRate, kMaxRate);
+    const int32_t accepted = std::clamp<int32_t>(sound.rate, TAVO_MIN_RATE, TAVO_MAX_RATE);
     if (sound.rate > 0 && sound.rate != accepted) {
-        sound = {sound_fd, limits.minutes, "", 0, 0};
+        sound = {sound_fd, limits.minutes, file_bytes, "", 0, 0};
         failed = decode_once({limits.program, path, fd, wav_output(accepted)}, stop_fd, sound);
     }
     if (!failed && sound.rate == 0) failed = {"ffmpeg decodes nothing of it."};

@@ -23,9 +23,9 @@
 namespace {
 
 constexpr size_t kMostMessageBytes = 65536;  // of the program's messages; the first line counts
-constexpr rlim_t kMostProgramBytes = rlim_t{4}
-                                     << 30;  // address space: a hostile file's allocations
-constexpr int kEndPollMs = 10;               // between two looks at a program that is ending
+// Address space: a damaged file makes it allocate hours of silence at once.
+constexpr rlim_t kMostProgramBytes = rlim_t{768} << 20;
+constexpr int kEndPollMs = 10;  // between two looks at a program that is ending
 
 // Containers that hold their sound themselves. Playlists and scripts (HLS, concat, DASH, SDP, image
 // sequences), which name other files, are not among them.
