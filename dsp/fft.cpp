@@ -41,27 +41,43 @@ void permute(T *re, T *im, int32_t n, const uint32_t *bit_reverse) {
     }
 }
 
-// Radix 2, decimation in time. T is double, or double_pair for two transforms in one pass.
+template <typename T>
+inline void butterfly(T *re, T *im, size_t top, size_t bottom, double w_re, double w_im) {
+    const T t_re = re[bottom] * w_re - im[bottom] * w_im;
+    const T t_im = re[bottom] * w_im + im[bottom] * w_re;
+    const T top_re = re[top];
+    const T top_im = im[top];
+    re[bottom] = top_re - t_re;
+    im[bottom] = top_im - t_im;
+    re[top] = top_re + t_re;
+    im[top] = top_im + t_im;
+}
+
+// Radix 2, decimation in time. T is double, or double_pair for two transforms in one pass. The
+// butterflies of a stage are independent: the longer of its two loops is the inner one.
 template <typename T>
 void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
     if (ctx->cos_table == nullptr || n != 1 << ctx->stages) return;
     permute(re, im, n, ctx->bit_reverse);
+    const double *w_re = ctx->cos_table;
+    const double *w_im = ctx->sin_table;
     const auto size = static_cast<size_t>(n);
     for (size_t half = 1; half < size; half *= 2) {
         const size_t stride = size / 2 / half;
-        for (size_t j = 0; j < half; ++j) {
-            const double w_re = ctx->cos_table[j * stride];
-            const double w_im = ctx->sin_table[j * stride];
-            for (size_t top = j; top < size; top += 2 * half) {
-                const size_t bottom = top + half;
-                const T t_re = re[bottom] * w_re - im[bottom] * w_im;
-                const T t_im = re[bottom] * w_im + im[bottom] * w_re;
-                const T top_re = re[top];
-                const T top_im = im[top];
-                re[bottom] = top_re - t_re;
-                im[bottom] = top_im - t_im;
-                re[top] = top_re + t_re;
-                im[top] = top_im + t_im;
+        if (half < stride) {
+            for (size_t j = 0; j < half; ++j) {
+                const double j_re = w_re[j * stride];
+                const double j_im = w_im[j * stride];
+                for (size_t top = j; top < size; top += 2 * half) {
+                    butterfly(re, im, top, top + half, j_re, j_im);
+                }
+            }
+        } else {
+            for (size_t group = 0; group < size; group += 2 * half) {
+                for (size_t j = 0; j < half; ++j) {
+                    butterfly(re, im, group + j, group + j + half, w_re[j * stride],
+                              w_im[j * stride]);
+                }
             }
         }
     }

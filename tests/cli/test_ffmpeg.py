@@ -14,7 +14,8 @@ ENCODED = {  # name: options of ffmpeg
     "late.mkv": "-f lavfi -i testsrc=size=64x64:rate=10:duration=20 -itsoffset 0.5 -i SONG -map 1 -map 2"}
 FAILING = {  # an ffmpeg of ours: what is said about it
     "kill -9 $$": "ffmpeg was ended by signal 9", "echo '[x @ 0x1] bad box.' >&2; echo y >&2; exit 1": "ffmpeg: bad box.",
-    "head -c 300000 a.wav; exit 3": "ffmpeg ended with status 3.", "exit 0": "decodes nothing", "exec sleep 60": ""}
+    "head -c 300000 a.wav; exit 3": "ffmpeg ended with status 3.",
+    "head -c 44 a.wav; cat /dev/zero": "longer than a file of its size can hold", "exit 0": "decodes nothing", "exec sleep 60": ""}
 NAMING_OTHERS = {"a.m3u8": b"#EXTM3U\n#EXT-X-TARGETDURATION:60\n#EXTINF:60,\na.ts\n#EXT-X-ENDLIST\n",
                  "a.ffconcat": b"ffconcat version 1.0\nfile a.ts\n", "a.mkv": b"ffconcat version 1.0\nfile a.ts\n"}
 
