@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
-# scripts/setup.sh [build|java|tests|cluster|fuzz|measure|package]...
-# Installs the Debian packages that are missing: build, java, tests and fuzz by default; build alone
+# scripts/setup.sh [build|java|tests|web|cluster|fuzz|measure|package]...
+# Installs the Debian packages that are missing: build, java, tests, web and fuzz by default; build alone
 # is enough for the library and the command. Prints nothing if none is missing.
 set -euo pipefail
 
@@ -17,23 +17,25 @@ tests=(
   doxygen groff-base zsh fish
   devscripts abigail-tools mypy python3-jsonschema python3-venv python3-pip python3-setuptools python3-wheel
 )
+web=(emscripten node-acorn nlohmann-json3-dev) # tavo.html: cmake --preset web
 cluster=(slurm-wlm munge postgresql postgresql-client) # scripts/test-cluster.sh
 fuzz=(clang libclang-rt-14-dev)
 measure=(clang libclang-rt-14-dev gcovr valgrind)
 package=(dpkg-dev debhelper dh-python doxygen lintian debootstrap) # scripts/test-package.sh, scripts/test-fresh.sh
 
 wanted=()
-for group in "${@:-build java tests fuzz}"; do
+for group in "${@:-build java tests web fuzz}"; do
   for name in $group; do
     case $name in
       build) wanted+=("${build[@]}") ;;
       java) wanted+=("${java[@]}") ;;
       tests) wanted+=("${tests[@]}") ;;
+      web) wanted+=("${web[@]}") ;;
       cluster) wanted+=("${cluster[@]}") ;;
       fuzz) wanted+=("${fuzz[@]}") ;;
       measure) wanted+=("${measure[@]}") ;;
       package) wanted+=("${package[@]}") ;;
-      *) echo "setup: no group '$name'; groups: build, java, tests, cluster, fuzz, measure, package" >&2; exit 2 ;;
+      *) echo "setup: no group '$name'; groups: build, java, tests, web, cluster, fuzz, measure, package" >&2; exit 2 ;;
     esac
   done
 done

@@ -12,6 +12,7 @@
 
 #include "cli/input/recognise.h"
 #include "cli/report/report_pages.h"
+#include "cli/report/song_json.h"
 #include "cli/write/file_names.h"
 #include "cli/write/json.h"
 #include "cli/write/markers.h"
@@ -20,7 +21,6 @@
 
 namespace {
 
-constexpr int kReportColumns = 4000;  // of the waveform: sharp when zoomed, about 30 KB
 constexpr int kMiniatureWidth = 140;
 constexpr int kMiniatureHeight = 28;
 
@@ -74,17 +74,6 @@ std::string base64(const std::string &bytes) {
         for (size_t k = 0; k < 4; ++k) {
             out += i + k <= bytes.size() ? kDigits[group >> (18 - 6 * k) & 63] : '=';
         }
-    }
-    return out;
-}
-
-// Samples on a scale of -127 to 127 of the song's own peak, lowest and highest in turn.
-result_json wave_of(const song_view &view) {
-    result_json out = result_json::array();
-    const double scale = 127.0 / std::max(view.peak, 1);
-    for (const extent &column : view.waveform) {
-        out.push_back(std::lround(column.low * scale));
-        out.push_back(std::lround(column.high * scale));
     }
     return out;
 }
@@ -151,27 +140,7 @@ std::string find_sound(const std::string &song_path, const std::string &page_pat
 
 // The whole page, UTF-8.
 std::string report_page(const record &result, const song_view &view, const report_sound &sound) {
-    result_json song = {{"name", as_utf8(base_name(result.file))},
-                        {"mode", mode_word(result.mode)},
-                        {"sample_rate", result.sample_rate},
-                        {"channels", result.channels},
-                        {"duration_ms", result.duration_ms},
-                        {"length_ms", view.length_ms},
-                        {"read_ms", view.read_ms},
-                        {"wave", wave_of(view)},
-                        {"loudness", view.loudness},
-                        {"mean", view.mean}};
-    if (result.has_highlight) {
-        song["hl_pos_ms"] = result.hl_pos_ms;
-        if (!view.loudness.empty()) song["searched_ms"] = searched_span(result, view);
-        song["region_end_ms"] = region_end_ms(result);
-        if (result.length_s > 0) song["hl_end_ms"] = song["region_end_ms"];
-        if (has_refinement(result)) song["hl_refined"] = is_refined(result);
-    }
-    if (result.has_beats) {
-        song["bpm"] = result.bpm;
-        song["beats_ms"] = result.beats_ms;
-    }
+    result_json song = song_json(result, view);
     if (!sound.note.empty()) song["note"] = sound.note;
     song[sound.link.empty() ? "embedded" : "audio"] =
         sound.link.empty() ? sound.embedded : sound.link;

@@ -178,12 +178,12 @@ outcome read_song_view(const record &result, int columns, int stop_fd, song_view
 }
 
 std::pair<double, double> searched_span(const record &result, const song_view &view) {
+    constexpr auto kHopMs = static_cast<double>(TAVO_LOUDNESS_HOP_MS);
+    constexpr auto kWindowMs = static_cast<double>(TAVO_LOUDNESS_WINDOW_MS);
     const bool is_short = result.duration_ms / 1000 < kShortSongSeconds;
     const double tail = is_short ? kShortSearchTail : kSearchTail;
-    const double start = is_short ? 0.0 : kSearchSkip * TAVO_LOUDNESS_HOP_MS;
+    const double start = is_short ? 0.0 : kSearchSkip * kHopMs;
     // The last window that is searched may have its rise at its very end.
     const double last = static_cast<double>(view.loudness.size()) - tail;
-    return {start, last < 0.0
-                       ? start
-                       : std::max(start, last * TAVO_LOUDNESS_HOP_MS + TAVO_LOUDNESS_WINDOW_MS)};
+    return {start, last < 0.0 ? start : std::max(start, last * kHopMs + kWindowMs)};
 }

@@ -1,5 +1,7 @@
 #include <unistd.h>
 
+#include <array>
+#include <charconv>
 #include <cmath>
 
 #include "cli/write/file_names.h"
@@ -19,6 +21,14 @@ std::string cell(const std::string &text) {
         out += c;
     }
     return out + "\"";
+}
+
+// The shortest decimal that gives the same float again.
+std::string number_text(float value) {
+    std::array<char, 64> text{};
+    const auto end =
+        std::to_chars(text.data(), text.data() + text.size(), value, std::chars_format::fixed);
+    return std::string(text.data(), end.ptr);
 }
 
 std::string spaced(const std::vector<float> &times) {

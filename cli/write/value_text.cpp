@@ -2,7 +2,6 @@
 
 #include <array>
 #include <cctype>
-#include <charconv>
 #include <cmath>
 #include <cstdio>
 #include <system_error>
@@ -72,13 +71,6 @@ std::string highlight_text(const record &result) {
 std::string tempo_text(const record &result) {
     return std::to_string(result.bpm) + " BPM" +
            (result.mode == TAVO_MODE_BOTH ? " from the highlight on" : "");
-}
-
-std::string number_text(float value) {
-    std::array<char, 64> text{};
-    const auto end =
-        std::to_chars(text.data(), text.data() + text.size(), value, std::chars_format::fixed);
-    return std::string(text.data(), end.ptr);
 }
 
 std::string count_text(size_t count, const char *noun) {

@@ -22,9 +22,6 @@ std::string highlight_text(const record &result);
 // "117 BPM", in mode both "117 BPM from the highlight on".
 std::string tempo_text(const record &result);
 
-// The shortest decimal that gives the same float again.
-std::string number_text(float value);
-
 // "1 file", "2 files".
 std::string count_text(size_t count, const char *noun);
 

@@ -16,7 +16,7 @@ ARGUMENTS = """--headless=new --no-sandbox --disable-gpu --disable-quic --no-fir
     --disable-component-update --disable-sync --disable-dev-shm-usage --mute-audio"""
 
 
-class Report(Case):
+class Browser(Case):
     @classmethod
     def setUpClass(cls):
         options = webdriver.ChromeOptions()
@@ -52,6 +52,8 @@ class Report(Case):
         self.wait("!player.playing()")
         self.assertEqual(self.browser.get_log("browser"), [])
 
+
+class Report(Browser):
     def test_a_song(self):
         self.put("song.wav", source=standard_song())
         (result,) = self.run_json("--length", "12", "--report", "page.html", "song.wav")

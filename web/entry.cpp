@@ -1,0 +1,109 @@
+// What the page's worker calls. Strings are UTF-8; a returned one is freed by the caller with free.
+#include <unistd.h>
+
+#include <cstdint>
+#include <cstring>
+#include <string>
+
+#include "cli/report/song_json.h"
+#include "cli/write/format.h"
+#include "cli/write/markers.h"
+#include "include/tavo.h"
+
+namespace {
+
+void store_result(TAVO_INFO *info, void *user) {
+    *static_cast<TAVO_INFO *>(user) = *info;  // beat_times is valid until tavo_deinit
+}
+
+// Fills the record from a finished job, or its error.
+void read_result(const TAVO_CTX *ctx, const TAVO_INFO &info, record &result) {
+    result.has_highlight = result.mode != TAVO_MODE_BEATS;
+    result.hl_pos_ms = info.hl_pos;
+    if (tavo_has_audio(ctx) == 0 || tavo_is_complete(ctx) == 0) {
+        result.error = "There is not enough memory to analyse the song.";
+    } else if (info.status != 0) {
+        result.error =
+            result.mode == TAVO_MODE_BOTH
+                ? "No beats were found after the highlight."
+                : "No beats were found: the file may be silent or too short for a rhythm.";
+    } else {
+        result.status = outcome::ok;
+    }
+    if (result.status != outcome::ok || result.mode == TAVO_MODE_HIGHLIGHT) return;
+    result.has_beats = true;
+    result.bpm = tavo_get_tempo(ctx);
+    result.beats_ms.assign(info.beat_times, info.beat_times + info.beat_count);
+}
+
+void analyse_song(record &result, int32_t max_beats) {
+    const TAVO_PARAM param = {result.file.c_str(), result.mode};
+    TAVO_CTX *ctx = tavo_init(&param, nullptr);
+    if (ctx == nullptr) {
+        const int32_t code = tavo_probe(result.file.c_str(), nullptr);
+        const int32_t reason = code == TAVO_OK ? TAVO_ERR_MEMORY : code;
+        result.error = "It cannot be analysed: " + std::string(tavo_error_text(reason)) + ".";
+        return;
+    }
+    tavo_get_stream(ctx, &result.sample_rate, &result.channels, &result.duration_ms);
+    result.has_stream = true;
+    TAVO_INFO info{};
+    tavo_set_listener(ctx, store_result, &info);
+    // Returns after the job: threads.c.
+    if (tavo_analyze(ctx, result.length_s, max_beats, 0) == TAVO_OK) {
+        read_result(ctx, info, result);
+    } else {
+        result.error = "The analysis could not be started.";
+    }
+    tavo_deinit(ctx);
+}
+
+}  // namespace
+
+// Analyses the WAV file at path. channels: of the song before the downmix. Returns JSON: "song" for
+// song.js and "result" as --format json has it; without "song" if the analysis failed.
+extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, int32_t max_beats,
+                             int32_t channels) {
+    fnamedec = "";
+    record result = failed_record(path, mode, "");
+    result.length_s = length_s;
+    analyse_song(result, max_beats);
+    result.channels = channels;
+    song_view view;
+    int stop_pipe[2] = {-1, -1};  // nobody writes to it: a page stops its worker
+    if (result.status == outcome::ok && pipe(stop_pipe) == 0) {
+        const outcome status =
+            read_song_view(result, kReportColumns, stop_pipe[0], view, result.error);
+        result.status = status;
+    }
+    result_json out;
+    if (result.status == outcome::ok) out["song"] = song_json(result, view);
+    out["result"] = result_json::parse(json_record(result));
+    return strdup(out.dump().c_str());
+}
+
+// The marker file of a result. result: the "result" of web_analyse. Returns the file's content, or
+// null for an unknown format.
+extern "C" char *web_markers(const char *result, int32_t length_s, const char *format,
+                             const char *fps) {
+    constexpr struct {
+        const char *word;
+        result_format format;
+    } kFormats[] = {
+        {"labels", result_format::labels}, {"kdenlive", result_format::kdenlive},
+        {"llc", result_format::llc},       {"ffmetadata", result_format::ffmetadata},
+        {"edl", result_format::edl},       {"fcpxml", result_format::fcpxml},
+        {"otio", result_format::otio},     {"reaper", result_format::reaper},
+    };
+    record song = record_from_json(result);
+    song.file = result_json::parse(result).value("file", "");
+    song.length_s = length_s;
+    options opts;
+    opts.fps = fps;
+    for (const auto &entry : kFormats) {
+        if (strcmp(entry.word, format) != 0) continue;
+        opts.format = entry.format;
+        return strdup(marker_content(song, opts).c_str());
+    }
+    return nullptr;
+}

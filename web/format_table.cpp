@@ -1,0 +1,9 @@
+// The formats of the page: WAV, in which it hands over what the browser decoded.
+#include "media_source/format_table.h"
+
+const format_ops *format_ops_of(int32_t type) {
+    static constexpr format_ops kWav = {kMtsrcTypeWav,      mtsource_wav_open,
+                                        mtsource_wav_close, mtsource_wav_get_frm,
+                                        mtsource_wav_seek,  mtsource_wav_reset};
+    return type == kMtsrcTypeWav ? &kWav : nullptr;
+}

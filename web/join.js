@@ -1,0 +1,15 @@
+// join.js OUT ENGINE.JS ENGINE.WASM TAVO.HTML PARTS...: writes the page with its parts inside. @NAME@
+// in the page stands for the part NAME.
+const fs = require("fs");
+const zlib = require("zlib");
+const [out, engine, wasm, page, ...parts] = process.argv.slice(2);
+
+const texts = { "engine.js": fs.readFileSync(engine, "utf8"),
+  "engine.wasm": zlib.gzipSync(fs.readFileSync(wasm), { level: 9 }).toString("base64") };
+for (const part of parts) texts[part.replace(/.*\//, "")] = fs.readFileSync(part, "utf8");
+const song = texts["song.html"].replace("@STYLE@", () => texts["page.css"]).replace("@SCRIPT@", () => texts["song.js"]);
+texts["song.html"] = JSON.stringify(song).replace(/</g, "\\u003c");
+fs.writeFileSync(out, fs.readFileSync(page, "utf8").replace(/@([a-z]+\.[a-z]+)@/g, (_, name) => {
+  if (texts[name] === undefined) throw new Error("no part " + name);
+  return texts[name];
+}));
