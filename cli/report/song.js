@@ -1,5 +1,5 @@
 "use strict";
-// Draws one song's result on one time axis, in ms, and plays the song.
+// Draws one song's result on one time axis, in ms of the player, and plays the song.
 const song = JSON.parse(document.getElementById("data").textContent);
 const byId = (id) => document.getElementById(id);
 const beats = song.beats_ms || [];
@@ -36,10 +36,11 @@ function drawWave() {
   const count = song.wave.length / 2;
   if (count === 0) return;
   const step = song.read_ms / count;
+  const x = (k) => (song.sound_ms + (k + .5) * step).toFixed(1);
   const y = (value) => (24 - value * 22 / 127).toFixed(2);
   let path = "";
-  for (let k = 0; k < count; ++k) path += `${k ? "L" : "M"}${((k + .5) * step).toFixed(1)} ${y(song.wave[2 * k + 1])}`;
-  for (let k = count; k-- > 0;) path += `L${((k + .5) * step).toFixed(1)} ${y(song.wave[2 * k])}`;
+  for (let k = 0; k < count; ++k) path += `${k ? "L" : "M"}${x(k)} ${y(song.wave[2 * k + 1])}`;
+  for (let k = count; k-- > 0;) path += `L${x(k)} ${y(song.wave[2 * k])}`;
   shape("path", { class: "wave", d: path + "Z" });
 }
 
@@ -47,8 +48,8 @@ function drawLoudness() {
   byId("loudname").hidden = song.loudness.length === 0;
   const top = Math.max(...song.loudness, song.mean, 1e-9);
   const y = (value) => (79 - value / top * 29).toFixed(2);
-  // A value stands in the middle of the 6 s that it is about.
-  const points = song.loudness.map((value, k) => `${2000 * k + 3000} ${y(value)}`);
+  // A value is drawn in the middle of its window of 6 s.
+  const points = song.loudness.map((value, k) => `${song.sound_ms + 2000 * k + 3000} ${y(value)}`);
   if (points.length > 0) {
     shape("path", { class: "loud", d: "M" + points.join("L") });
     shape("line", { class: "mean", x1: 0, x2: song.length_ms, y1: y(song.mean), y2: y(song.mean) });
@@ -165,7 +166,8 @@ function zoomToBeat() {
 
 // ---- Sound. A linked file plays in an audio element: a page from disk cannot route it through an
 // audio context, so the clicks have a context of their own. An embedded file is decoded and plays
-// in the clicks' context: then both are exact to the sample.
+// in the clicks' context, so that both share one clock. Either way the browser drops the encoder
+// delay that the file states; the page's times already account for it.
 
 let context = null;
 function wake() {

@@ -28,21 +28,28 @@ result_json song_json(const record &result, const song_view &view) {
                         {"sample_rate", result.sample_rate},
                         {"channels", result.channels},
                         {"duration_ms", result.duration_ms},
-                        {"length_ms", view.length_ms},
+                        {"length_ms", player_ms(result, view.length_ms)},
+                        {"sound_ms", -result.offset_ms},
                         {"read_ms", view.read_ms},
                         {"wave", wave_of(view)},
                         {"loudness", view.loudness},
                         {"mean", view.mean}};
     if (result.has_highlight) {
-        song["hl_pos_ms"] = result.hl_pos_ms;
-        if (!view.loudness.empty()) song["searched_ms"] = searched_span(result, view);
-        song["region_end_ms"] = region_end_ms(result);
+        song["hl_pos_ms"] = player_ms(result, result.hl_pos_ms);
+        if (!view.loudness.empty()) {
+            const auto [from, to] = searched_span(result, view);
+            song["searched_ms"] = {player_ms(result, from), player_ms(result, to)};
+        }
+        song["region_end_ms"] = player_ms(result, region_end_ms(result));
         if (result.length_s > 0) song["hl_end_ms"] = song["region_end_ms"];
         if (has_refinement(result)) song["hl_refined"] = is_refined(result);
     }
     if (result.has_beats) {
         song["bpm"] = result.bpm;
-        song["beats_ms"] = result.beats_ms;
+        song["beats_ms"] = result_json::array();
+        for (const float beat : result.beats_ms) {
+            song["beats_ms"].push_back(player_ms(result, static_cast<double>(beat)));
+        }
     }
     return song;
 }

@@ -9,6 +9,7 @@
 
 constexpr int kReportColumns = 4000;  // of the waveform: sharp when zoomed, about 30 KB
 
+// All times are the player's; the first decoded sample is at sound_ms, which may be negative.
 // Without the sound: the caller adds "audio" (a URL) or "embedded" (base64).
 result_json song_json(const record &result, const song_view &view);
 

@@ -3,6 +3,7 @@ import json
 import os
 import re
 import struct
+import subprocess
 import xml.etree.ElementTree as ElementTree
 
 from selenium import webdriver
@@ -119,6 +120,15 @@ class Report(Browser):
         for seconds, searched in ((60, [0, 42000]), (100, [18000, 52000])):
             self.put("song.wav", source=song(seconds=seconds, bpm=120, rate=8000, channels=1))
             self.assertEqual(view("song.wav", "--mode", "highlight")["searched_ms"], searched)
+        # An MP3, whose encoder's delay players drop.
+        subprocess.run(["lame", "--quiet", standard_song(), self.folder / "song.mp3"], check=True)
+        page = view("song.mp3", "--length", "12")
+        (result,) = self.run_json("--length", "12", "song.mp3")
+        self.assertGreater(result["offset_ms"], 10)
+        shifted = [ms - result["offset_ms"] for ms in (0, result["hl_pos_ms"], result["hl_end_ms"], *result["beats_ms"])]
+        times = [page["sound_ms"], page["hl_pos_ms"], page["hl_end_ms"], *page["beats_ms"]]
+        for ms, expected in zip(times, shifted, strict=True):
+            self.assertAlmostEqual(ms, expected, delta=0.01)
 
     def test_screens(self):
         self.put("song.wav", source=standard_song())
