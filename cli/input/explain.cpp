@@ -130,6 +130,6 @@ failure explain_refusal(const std::string &path, int32_t code, record &result) {
 failure check_duration(int64_t duration_ms, int32_t max_minutes) {
     if (duration_ms <= max_minutes * kMsPerMinute) return {};
     return {"The audio lasts " + whole_clock_text(static_cast<double>(duration_ms)) +
-            " by what the file states; --max-minutes allows " + std::to_string(max_minutes) +
-            " minutes."};
+            ", as the file states; the limit is --max-minutes " + std::to_string(max_minutes) +
+            "."};
 }

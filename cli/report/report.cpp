@@ -17,7 +17,6 @@
 #include "cli/write/json.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"
-#include "media_source/mtsrc.h"
 
 namespace {
 
@@ -210,8 +209,15 @@ std::string begin_report_index(report_index &index, const options &opts) {
     std::string error = check_report(opts.report, opts.force);
     if (!error.empty()) return error;
     const std::string folder = pages_folder(opts);
-    if (mkdir(folder.c_str(), 0777) != 0 && errno != EEXIST) {
-        return system_sentence("The folder " + shown(folder) + " cannot be made", errno);
+    const int code = mkdir(folder.c_str(), 0777) == 0 ? 0 : errno;
+    struct stat info {};
+    const bool is_folder = lstat(folder.c_str(), &info) == 0 && S_ISDIR(info.st_mode);
+    if (code == EEXIST && !is_folder) {
+        return "The folder " + shown(folder) +
+               " cannot be made: a symbolic link or a file has its name.";
+    }
+    if (code != 0 && code != EEXIST) {
+        return system_sentence("The folder " + shown(folder) + " cannot be made", code);
     }
     error = begin_output(index.file, opts.report);
     index.open = error.empty();
@@ -243,12 +249,12 @@ std::string report_index_row(const record &result, const song_view &view, const 
                html_text(result.error) + "</td></tr>\n";
     }
     const auto duration = static_cast<double>(result.duration_ms);
+    const double start = player_ms(result, result.hl_pos_ms);
     return "<tr><td class=\"name\"><a href=\"" + percent_encoded(page) + "\">" + name +
            "</a></td>\n" + number_cell(clock_text(duration), duration) +
            (result.has_beats ? number_cell(std::to_string(result.bpm), result.bpm)
                              : "<td></td>\n") +
-           (result.has_highlight ? number_cell(clock_text(result.hl_pos_ms), result.hl_pos_ms)
-                                 : "<td></td>\n") +
+           (result.has_highlight ? number_cell(clock_text(start), start) : "<td></td>\n") +
            (result.has_beats ? number_cell(std::to_string(result.beats_ms.size()),
                                            static_cast<double>(result.beats_ms.size()))
                              : "<td></td>\n") +

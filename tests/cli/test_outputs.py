@@ -45,8 +45,15 @@ class Outputs(Case):
             for place in places.split():
                 (result,) = self.run_json("--force", option, place, "song.wav", status=1)
                 self.assertRegex(result["error"], "click|page|cannot be written", (option, place))
+        self.put("kept/file", b"mine\n")
+        for link, target, songs in (("page.html", "song.wav", 1), ("page.html", "nowhere", 2), ("page_songs", "kept", 2)):
+            (self.folder / link).symlink_to(target)
+            self.run_tavo("--force", "--report", "page.html", *songs * ["song.wav"], status=1, said=link.encode())
+            self.assertEqual((self.folder / link).readlink().name, target)
+            (self.folder / link).unlink()
+        self.assertEqual(os.listdir(self.folder / "kept"), ["file"])
         self.assertEqual(self.song.read_bytes(), before)
-        self.assert_only("song.wav")
+        self.assert_only("song.wav", "kept")
 
     def test_failures_leave_nothing(self):
         self.put("silent.wav", wav(seconds=3, sample=bytes(32)))

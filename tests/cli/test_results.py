@@ -35,6 +35,7 @@ REFUSED = {  # content when it is a file of ours, a part of the sentence
     "no-channels.wav": (wav(seconds=0.0)[:22] + b"\0\0" + wav()[24:], "WAV file is damaged or"),
     "no-data.wav": (wav()[:36], "no usable audio stream"),
     "lies.wav": (wav(seconds=0.5, data_size=0xFFFFFFFF), "lasts 0.500 s"),
+    "long.wav": (wav(seconds=61.0, rate=8000), "The audio lasts 1:01"),
     "silence.wav": (wav(seconds=7.0, sample=b"\0"), "No beats were found"),
     "secret.wav": (wav(), "permission denied"), "closed/in.wav": (wav(), "permission denied"),
     "closed": (None, "permission denied"), "pipe": (None, "device, pipe"), "/dev/zero": (None, "device, pipe"),
@@ -118,7 +119,7 @@ class Results(Case):
         (self.folder / "secret.wav").chmod(0)
         (self.folder / "closed").chmod(0)
         self.addCleanup(os.chmod, self.folder / "closed", 0o700)
-        done = self.run_tavo("--no-ffmpeg", "--format", "json", *REFUSED, status=1, before=AS_ORDINARY_USER)
+        done = self.run_tavo("--no-ffmpeg", "--max-minutes", "1", "-f", "json", *REFUSED, status=1, before=AS_ORDINARY_USER)
         messages = done.stderr.decode().splitlines()
         results = self.objects(done.stdout)
         for result, message, (name, (_, said)) in zip(results, messages, REFUSED.items(), strict=True):
