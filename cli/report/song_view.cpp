@@ -5,13 +5,10 @@
 #include <algorithm>
 #include <array>
 #include <cmath>
-#include <cstdlib>
 #include <memory>
-#include <new>
+#include <numeric>
 
 #include "cli/input/short_path.h"
-#include "common/tavo_ctx.h"
-#include "highlight/power_envelope.h"
 #include "highlight/search.h"
 #include "include/tavo.h"
 #include "media_source/mtsrc.h"
@@ -31,9 +28,11 @@ struct bins {
 };
 
 struct loudness_curve {
-    std::vector<int16_t> window;
-    size_t filled = 0;  // samples in window
-    size_t hop = 0;     // samples
+    size_t hop = 0;            // samples
+    size_t filled = 0;         // samples of the hop that is not complete
+    double sum = 0.0;          // of their squares
+    size_t complete_hops = 0;  // since the start
+    std::array<double, TAVO_LOUDNESS_WINDOW_MS / TAVO_LOUDNESS_HOP_MS> hops{};  // the last sums
     std::vector<float> values;
 };
 
@@ -61,24 +60,21 @@ void add_samples(bins &waveform, const int16_t *pcm, size_t count) {
     }
 }
 
-// Calls the library for one window at a time: the values equal those of the whole song.
-void add_samples(loudness_curve &curve, const int16_t *pcm, size_t count, int32_t rate) {
-    while (count > 0) {
-        const size_t copied = std::min(count, curve.window.size() - curve.filled);
-        std::copy(pcm, pcm + copied, curve.window.data() + curve.filled);
-        curve.filled += copied;
-        pcm += copied;
-        count -= copied;
-        if (curve.filled < curve.window.size()) return;
-        TAVO_HL_CTX highlight{};
-        const auto size = static_cast<int64_t>(curve.window.size());
-        const int32_t values = _calc_power_level(curve.window.data(), size, rate, &highlight);
-        const std::unique_ptr<float, decltype(&free)> owner(highlight.power, free);
-        if (values != 1) throw std::bad_alloc();
-        curve.values.push_back(highlight.power[0]);
-        std::copy(curve.window.begin() + static_cast<ptrdiff_t>(curve.hop), curve.window.end(),
-                  curve.window.begin());
-        curve.filled -= curve.hop;
+// Appends a value for each window, by the formula of tavo_get_loudness. A window consists of whole
+// hops; the sum of squares is kept for each hop.
+void add_samples(loudness_curve &curve, const int16_t *pcm, size_t count) {
+    for (size_t i = 0; i < count; ++i) {
+        const double sample = pcm[i] / 32767.0;
+        curve.sum += sample * sample;
+        if (++curve.filled < curve.hop) continue;
+        std::rotate(curve.hops.begin(), curve.hops.begin() + 1, curve.hops.end());
+        curve.hops.back() = curve.sum;
+        curve.sum = 0.0;
+        curve.filled = 0;
+        if (++curve.complete_hops < curve.hops.size()) continue;
+        const double total = std::accumulate(curve.hops.begin(), curve.hops.end(), 0.0);
+        const auto samples = static_cast<double>(curve.hop * curve.hops.size());
+        curve.values.push_back(static_cast<float>(10.0 * std::log10(total / samples + 1.0)));
     }
 }
 
@@ -94,8 +90,7 @@ struct sound {
 };
 
 outcome read_source(mtsrc_ctx *source, int32_t rate, int stop_fd, sound &song) {
-    song.loudness.window.resize(static_cast<size_t>(kPowerWindowSeconds * rate));
-    song.loudness.hop = static_cast<size_t>(kPowerHopSeconds * rate);
+    song.loudness.hop = static_cast<size_t>(rate) * TAVO_LOUDNESS_HOP_MS / 1000;
     std::array<int16_t, kBlockSamples> block{};
     for (int32_t code = 0; code == 0;) {
         if (stop_requested(stop_fd)) return outcome::stopped;
@@ -104,7 +99,7 @@ outcome read_source(mtsrc_ctx *source, int32_t rate, int stop_fd, sound &song) {
         if (code < 0 || frame.size <= 0) break;
         const auto count = static_cast<size_t>(frame.size) / sizeof(int16_t);
         add_samples(song.waveform, block.data(), count);
-        add_samples(song.loudness, block.data(), count, rate);
+        add_samples(song.loudness, block.data(), count);
         song.samples += static_cast<int64_t>(count);
     }
     if (song.waveform.current_samples > 0) {

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "highlight/power_envelope.h"
+#include "include/tavo.h"
 
 record failed_record(const std::string &file, int32_t mode, const std::string &error) {
     record result;
@@ -27,5 +27,5 @@ bool has_refinement(const record &result) {
 }
 
 bool is_refined(const record &result) {
-    return result.hl_pos_ms % (1000 * kPowerHopSeconds) != 0;
+    return result.hl_pos_ms % TAVO_LOUDNESS_HOP_MS != 0;
 }
