@@ -19,7 +19,7 @@ enum class list_state { name, waiting, ended, failed };
 
 failure open_list(list_reader &list, const std::string &name);
 
-// Takes the next name: one that ends with the separator, or what stands before the list's end.
+// Reads the next name, which ends at the separator or at the end of the list.
 // Lists with a newline per name may be M3U playlists: carriage returns at line ends and comments
 // are dropped. failed says why when the state is failed. Never waits.
 list_state next_name(list_reader &list, char separator, std::string &name, failure &failed);

@@ -1,5 +1,5 @@
 // What a file contains, by its first bytes rather than by its name. The library decides what can be
-// analysed; this tells audio from other files without opening it, and names it for people.
+// analysed; this distinguishes audio from other files without opening it, and names it for people.
 #ifndef TAVO_CLI_INPUT_RECOGNISE_H
 #define TAVO_CLI_INPUT_RECOGNISE_H
 

@@ -21,7 +21,7 @@ failure fill_template(const std::string &text, const record &result, std::string
 std::string text_record(const record &result);
 std::string json_record(const record &result);
 
-// The record that json_record made the text of, but for the file's name. Throws std::exception for
+// The record that json_record made the text of, except the file's name. Throws std::exception for
 // any other text.
 record record_from_json(const std::string &text);
 std::string csv_head();

@@ -45,7 +45,7 @@ std::string kdenlive_guides(const record &result, const options & /*opts*/) {
     return out;
 }
 
-// Segments: the highlight, then what lies between a beat and the next or the end of the song.
+// Segments: the highlight, then one from each beat to the next or to the end of the song.
 std::string losslesscut_project(const record &result, const options & /*opts*/) {
     const std::vector<mark> marks = marks_of(result);
     nlohmann::ordered_json segments = nlohmann::ordered_json::array();
