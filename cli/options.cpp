@@ -10,6 +10,7 @@
 #include <sstream>
 
 #include "cli/input/ffmpeg_process.h"
+#include "cli/write/file_names.h"
 #include "cli/write/format.h"
 #include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
@@ -227,13 +228,22 @@ void declare_output(CLI::App &app, options &out, raw_values &raw) {
                    "(drop-frame), 30 (default), 50, 59.94, 59.94df, 60")
         ->check(CLI::IsMember(frame_rate_names()).description(""))
         ->type_name("RATE");
-    app.add_flag("--force", out.force, "Overwrite marker files, click tracks and pages that exist");
+    app.add_flag("--force", out.force,
+                 "Overwrite marker files, click tracks, clips and pages that exist");
     app.add_flag("--skip-existing", out.skip_existing, "Leave out inputs whose marker file exists");
     app.add_option("--click", out.click,
                    "Write the analysed sound with a click on every beat, a WAV file; from the "
                    "highlight on in "
                    "mode both; one input only")
         ->type_name("WAV");
+    app.add_option(
+           "--clip", out.clip,
+           "Cut --length seconds of highlight into an audio file of the name's kind, or into "
+           "a file for each input in a folder; needs ffmpeg")
+        ->type_name("FILE|DIR");
+    app.add_option("--fade", out.fade_s, "Fade the clip in at its start and out at its end")
+        ->check(CLI::Range(0.0, static_cast<double>(kMostSeconds)).description(""))
+        ->type_name("SECONDS");
     app.add_flag("-q,--quiet", out.quiet, "No progress bar and no notes");
 }
 
@@ -292,7 +302,7 @@ void set_values(const raw_values &raw, options &out) {
     }
     if (!out.print.empty()) out.format = result_format::print;
     if (!raw.fps.empty()) out.fps = raw.fps;
-    for (std::string *path : {&out.click, &out.report, &out.store, &out.print}) {
+    for (std::string *path : {&out.click, &out.clip, &out.report, &out.store, &out.print}) {
         unshield(*path);
     }
     unshield(out.output_dir);
@@ -318,6 +328,22 @@ std::string catalogue_contradiction(const options &out) {
         return "--from-store needs --format or --report.";
     }
     return "";
+}
+
+std::string clip_contradiction(const options &out) {
+    if (out.clip.empty()) return out.fade_s > 0.0 ? "--fade is about --clip." : "";
+    if (out.length_s == 0) return "--clip needs --length, its seconds.";
+    if (out.mode == TAVO_MODE_BEATS) return "--clip needs a highlight: --mode highlight or both.";
+    if (2 * out.fade_s > out.length_s) return "--fade takes at most half of --length.";
+    if (out.ffmpeg.empty()) return "--clip needs the ffmpeg program, which was not found.";
+    if (out.clip == out.click || out.clip == out.report) {
+        return "--clip names the file of another option.";
+    }
+    if (is_folder(out.clip)) return "";
+    if (!takes_one_file(out))
+        return "--clip takes exactly one audio file, or a folder for the clips.";
+    const std::string name = base_name(out.clip);
+    return stem(name) != name ? "" : "--clip needs a folder, or a name with an ending: clip.mp3.";
 }
 
 // What is wrong with options that are right by themselves. Empty when all is well.
@@ -353,7 +379,8 @@ std::string contradiction(const options &out, const raw_values &raw) {
     if (out.embed && out.report.empty()) return "--embed is about --report.";
     if (!out.click.empty() && out.click == out.report) return "--click and --report name one file.";
     if (!out.click.empty() && !takes_one_file(out)) return "--click takes exactly one audio file.";
-    return catalogue_contradiction(out);
+    const std::string about_clip = clip_contradiction(out);
+    return about_clip.empty() ? catalogue_contradiction(out) : about_clip;
 }
 
 // Says which options do other than a newcomer may expect.

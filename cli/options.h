@@ -34,6 +34,8 @@ struct options {
     result_format format = result_format::text;
     std::string print;       // template of the format print
     std::string click;       // where the click track goes, empty for none
+    std::string clip;        // where clips go, a file or a folder; empty for none
+    double fade_s = 0.0;     // of a clip, at either end
     std::string report;      // where the page goes, empty for none
     bool embed = false;      // the sound goes into the page
     std::string output_dir;  // of marker files; empty: beside each input

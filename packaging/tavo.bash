@@ -22,13 +22,13 @@ _tavo() {
             59.94df 60' -- "$word") ;;
         --shard) mapfile -t COMPREPLY < <(compgen -W 'auto' -- "$word") ;;
         -o | --output-dir) mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
-        -l | --length | -j | --jobs | --max-beats | --max-minutes | --print | --patience | --timeout) ;; # a number
-        --click | --report | --files-from | --store) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
+        -l | --length | -j | --jobs | --max-beats | --max-minutes | --fade | --print | --patience | --timeout) ;; # a number
+        --click | --clip | --report | --files-from | --store) mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
         *)
             if [[ $word == -* ]]; then
                 mapfile -t COMPREPLY < <(compgen -W '-h --help --version
                     -m --mode -l --length --max-beats --max-minutes -j --jobs --timeout --no-ffmpeg
-                    -f --format --print -o --output-dir --fps --force --skip-existing --click --report --embed -q --quiet
+                    -f --format --print -o --output-dir --fps --force --skip-existing --click --clip --fade --report --embed -q --quiet
                     -r --recursive --files-from -0 --null
                     --store --retry-failed --redo --from-store --failed --patience --shard' -- "$word")
             else

@@ -22,6 +22,8 @@ _arguments -s -S \
   '(-r --recursive)'{-r,--recursive}'[search folders inside folders too]' \
   '*--files-from=[take names from a list]:list:_files' \
   '(-0 --null)'{-0,--null}'[names in lists end with a NUL]' \
+  '--clip=[cut the highlight into an audio file]:file or folder:_files' \
+  '--fade=[seconds of fade at either end of the clip]:seconds:' \
   '--report=[write a page that shows and plays the result]:file:_files' \
   '--embed[put the sound into the page]' \
   '--store=[keep the results in a database]:file:_files' \

@@ -82,22 +82,11 @@ int64_t size_of_file(const std::string &path, int fd) {
     return code == 0 ? info.st_size : 0;
 }
 
-// Players start their time line at 0 and play gaps as silence: so does the filter. Without tags the
-// header has a fixed size.
+// Without tags the header has a fixed size.
 std::vector<std::string> wav_output(int32_t rate) {
-    std::vector<std::string> words = {"-map",
-                                      "0:a:0",
-                                      "-af",
-                                      "aresample=async=1:first_pts=0",
-                                      "-ac",
-                                      "1",
-                                      "-c:a",
-                                      "pcm_s16le",
-                                      "-map_metadata",
-                                      "-1",
-                                      "-bitexact",
-                                      "-f",
-                                      "wav"};
+    std::vector<std::string> words = {"-map",      "0:a:0", "-af",       kPlayerTimeFilter, "-ac",
+                                      "1",         "-c:a",  "pcm_s16le", "-map_metadata",   "-1",
+                                      "-bitexact", "-f",    "wav"};
     if (rate > 0) words.insert(words.end(), {"-ar", std::to_string(rate)});
     words.emplace_back("pipe:1");
     return words;

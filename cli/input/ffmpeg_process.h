@@ -33,6 +33,9 @@ failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink);
 
 constexpr int kIdleSeconds = 30;
 
+// Players start their time line at 0 and play gaps as silence: so does this filter.
+constexpr const char *kPlayerTimeFilter = "aresample=async=1:first_pts=0";
+
 // True once stop_fd is readable or closed at its other end.
 bool is_stop_requested(int stop_fd);
 

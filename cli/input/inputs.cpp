@@ -9,6 +9,7 @@
 #include "cli/input/ffmpeg.h"
 #include "cli/input/recognise.h"
 #include "cli/input/short_path.h"
+#include "cli/write/clip.h"
 #include "cli/write/file_names.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"
@@ -30,10 +31,9 @@ file_id id_of(const struct stat &info) {
     return {info.st_dev, info.st_ino};
 }
 
-// Claims the marker file of an input, so that no other input writes the same one. False leaves the
-// input out.
-bool claim_target(input_supply &supply, input &entry) {
-    const std::string target = marker_path(entry.path, supply.opts);
+// Claims the marker file or clip of an input, so that no other input writes the same one. False
+// leaves the input out.
+bool claim_target(input_supply &supply, input &entry, const std::string &target) {
     const std::string name = base_name(target);
     struct stat info {};
     if (supply.opts.skip_existing && lstat(target.c_str(), &info) == 0) {
@@ -55,6 +55,13 @@ bool claim_target(input_supply &supply, input &entry) {
     entry.refusal = {"Its file " + shown(target) +
                      " would replace that of another input, whose name is the same."};
     return true;
+}
+
+bool claim_targets(input_supply &supply, input &entry) {
+    const options &opts = supply.opts;
+    return (!writes_files(opts.format) ||
+            claim_target(supply, entry, marker_path(entry.path, opts))) &&
+           (opts.clip.empty() || claim_target(supply, entry, clip_path(entry.path, opts)));
 }
 
 // The entries' names in the order of their bytes. Returns 0 or errno.
@@ -199,9 +206,7 @@ supply_state next_input(input_supply &supply, input &out) {
     for (size_t steps = 0; !is_done(supply) && !waiting; ++steps) {
         if (steps == kStepsAtOnce) return supply_state::searching;
         if (!take_next(supply, out, waiting)) continue;
-        if (out.refusal || !writes_files(supply.opts.format) || claim_target(supply, out)) {
-            return supply_state::ready;
-        }
+        if (out.refusal || claim_targets(supply, out)) return supply_state::ready;
     }
     if (waiting) return supply_state::waiting;
     if (supply.existing > 0) {

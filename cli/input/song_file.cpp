@@ -67,7 +67,7 @@ failure read_inherited_pipe(int from, int stop_fd, song_file &song) {
     struct stat info {};
     if (code == 0 && fstat(fd, &info) != 0) code = errno;
     if (code == 0 && info.st_size >= TAVO_MIN_FILE_BYTES) {
-        song = {"/proc/self/fd/" + std::to_string(fd), fd, false};
+        song = {"/proc/self/fd/" + std::to_string(fd), fd, fd, false};
         return {};
     }
     if (fd >= 0) close(fd);
@@ -83,7 +83,7 @@ failure open_song(const std::string &path, int stop_fd, song_file &song) {
     if (is_inherited_pipe(inherited)) return read_inherited_pipe(inherited, stop_fd, song);
     if (failure failed = check_file(path)) return failed;
     const short_path opened = open_short_path(path);
-    song = {opened.path, opened.fd, false};
+    song = {opened.path, opened.fd, opened.fd, false};
     return {};
 }
 
@@ -101,12 +101,12 @@ failure decode_song(const std::string &path, const options &opts, int stop_fd, s
     const ffmpeg_limits limits = {opts.ffmpeg, opts.max_minutes};
     if (failure failed = decode_with_ffmpeg(limits, path, song.fd, stop_fd, sound_fd))
         return failed;
-    close_song(song);
-    song = {"/proc/self/fd/" + std::to_string(sound_fd), sound_fd, true};
+    song = {"/proc/self/fd/" + std::to_string(sound_fd), sound_fd, song.fd, true};
     return {};
 }
 
 void close_song(song_file &song) {
     if (song.fd >= 0) close(song.fd);
-    song.fd = -1;
+    if (song.source_fd >= 0 && song.source_fd != song.fd) close(song.source_fd);
+    song.fd = song.source_fd = -1;
 }

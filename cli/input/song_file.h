@@ -13,6 +13,7 @@
 struct song_file {
     std::string path;        // for the library; holds at least until close_song
     int fd = -1;             // kept open for path, -1 for none
+    int source_fd = -1;      // what the song was before ffmpeg decoded it; -1 if a file
     bool by_ffmpeg = false;  // path leads to ffmpeg's sound
 };
 

@@ -157,7 +157,8 @@ void fill_view(const record &result, const sound &song, int columns, song_view &
 outcome read_song_view(const record &result, int columns, int stop_fd, song_view &view,
                        std::string &error) {
     sound song;
-    short_path opened = open_short_path(result.file);
+    short_path opened =
+        open_short_path(result.sound_path.empty() ? result.file : result.sound_path);
     const outcome status = read_file(opened.path, result.sample_rate, stop_fd, song);
     close_short_path(opened);
     if (status == outcome::stopped) {

@@ -114,6 +114,7 @@ void analyse_opened(const options &opts, int stop_fd, song_file &song, record &o
         failed = decode_song(out.file, opts, stop_fd, song);
         if (!failed) {
             out.decoder = "ffmpeg";
+            out.sound_path = song.path;
             return analyse_opened(opts, stop_fd, song, out);
         }
     }

@@ -33,7 +33,8 @@ struct record {
     int32_t bpm = 0;
     std::vector<float> beats_ms;  // ascending, from the start of the file
 
-    std::string decoder;  // "ffmpeg" if that program decoded the file, else empty
+    std::string decoder;     // "ffmpeg" if that program decoded the file, else empty
+    std::string sound_path;  // what it decoded, while the song is open
 
     int64_t cpu_ms = -1;  // processor time of the analysis, all threads; -1 without one
 

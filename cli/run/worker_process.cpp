@@ -12,6 +12,7 @@
 
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
+#include "cli/write/clip.h"
 #include "cli/write/file_names.h"
 #include "cli/write/format.h"
 #include "cli/write/markers.h"
@@ -34,6 +35,10 @@ record find_result(const request &asked, const options &opts, int stop_fd, song_
     }
     out.file = asked.path;
     out.length_s = opts.length_s;
+    const bool is_decoded = !out.decoder.empty() && !opts.report.empty() &&
+                            !open_song(asked.path, stop_fd, song) &&
+                            !decode_song(asked.path, opts, stop_fd, song);
+    if (is_decoded) out.sound_path = song.path;
     return out;
 }
 
@@ -87,16 +92,24 @@ companion page_of(const request &asked, const options &opts, int stop_fd, std::s
             [=, &row](record &result) { write_report_page(result, opts, target, stop_fd, row); }};
 }
 
+companion clip_of(const request &asked, const options &opts, int stop_fd, const song_file &song) {
+    if (opts.clip.empty()) return {};
+    const std::string target = clip_path(asked.path, opts);
+    return {true, check_target(target, opts.force),
+            [=, &opts, &song](record &result) { write_clip(result, opts, target, stop_fd, song); }};
+}
+
 // is_kept becomes false if the song could be analysed and only a file beside it failed: the store
 // does not take that for a song that fails.
 record analyse_and_write(const request &asked, const options &opts, int stop_fd, std::string &row,
                          bool &is_kept) {
-    const companion companions[] = {page_of(asked, opts, stop_fd, row), markers_of(asked, opts)};
+    song_file song;
+    const companion companions[] = {page_of(asked, opts, stop_fd, row), markers_of(asked, opts),
+                                    clip_of(asked, opts, stop_fd, song)};
     for (const companion &each : companions) {
         is_kept = each.refusal.empty();
         if (!is_kept) return failed_record(asked.path, opts.mode, each.refusal);
     }
-    song_file song;
     record out = find_result(asked, opts, stop_fd, song);
     const bool is_ok = out.status == outcome::ok;
     for (const companion &each : companions) {

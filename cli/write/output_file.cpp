@@ -64,10 +64,10 @@ std::string check_target(const std::string &target, bool force) {
     return "";
 }
 
-std::string begin_output(output_file &file, const std::string &target) {
+std::string begin_output(output_file &file, const std::string &target, const std::string &ending) {
     file.target = target;
-    file.temporary = folder_of(target) + "/.tavo-XXXXXX";
-    file.fd = mkostemp(file.temporary.data(), O_CLOEXEC);
+    file.temporary = folder_of(target) + "/.tavo-XXXXXX" + ending;
+    file.fd = mkostemps(file.temporary.data(), static_cast<int>(ending.size()), O_CLOEXEC);
     if (file.fd < 0) {
         const int code = errno;
         file.temporary.clear();
@@ -76,7 +76,7 @@ std::string begin_output(output_file &file, const std::string &target) {
     note_temporary_file(file.temporary);
     const mode_t mask = umask(0);
     umask(mask);
-    fchmod(file.fd, 0666 & ~mask);  // mkostemp's own permissions let nobody else read
+    fchmod(file.fd, 0666 & ~mask);  // mkostemps' own permissions let nobody else read
     return "";
 }
 

@@ -20,7 +20,9 @@ bool same_file(const std::string &a, const std::string &b);
 // does not exist. Creates nothing.
 std::string check_target(const std::string &target, bool force);
 
-std::string begin_output(output_file &file, const std::string &target);
+// ending: of the temporary file's name, for programs that go by it.
+std::string begin_output(output_file &file, const std::string &target,
+                         const std::string &ending = "");
 std::string write_output(output_file &file, const std::string &content);
 
 // Gives the file its name. Without force an existing target stays and the temporary is removed.

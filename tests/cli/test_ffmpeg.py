@@ -1,8 +1,10 @@
-"""What the command does with the ffmpeg program: it decodes what the library refuses."""
+"""What the command does with the ffmpeg program: it decodes what the library refuses and cuts clips."""
+import os
 import pathlib
 import signal
 import subprocess
 
+import numpy as np
 from command_case import Case, song
 
 SONG = song(seconds=20, bpm=120, loud_at=8)
@@ -16,6 +18,9 @@ FAILING = {  # an ffmpeg of ours: what is said about it
     "kill -9 $$": "ffmpeg was ended by signal 9", "echo '[x @ 0x1] bad box.' >&2; echo y >&2; exit 1": "ffmpeg: bad box.",
     "head -c 300000 a.wav; exit 3": "ffmpeg ended with status 3.",
     "head -c 44 a.wav; cat /dev/zero": "longer than a file of its size can hold", "exit 0": "decodes nothing", "exec sleep 60": ""}
+CLIPPED = {"a.wav": "", "a.mp3": "", "bare.mp3": "-write_xing 0", "a.m4a": "", "a.flac": "", "a.ogg": "", "a.aac": "", "a.webm": "-c:a libopus",
+           "late.mkv": ENCODED["late.mkv"]}
+RATE, FRAME = 44100, 1152  # of the sound compared; samples of the longest compressed frame
 NAMING_OTHERS = {"a.m3u8": b"#EXTM3U\n#EXT-X-TARGETDURATION:60\n#EXTINF:60,\na.ts\n#EXT-X-ENDLIST\n",
                  "a.ffconcat": b"ffconcat version 1.0\nfile a.ts\n", "a.mkv": b"ffconcat version 1.0\nfile a.ts\n"}
 
@@ -35,11 +40,47 @@ class Ffmpeg(Case):
         program.chmod(0o755)
         return {"env": {"PATH": f"{program.parent}:/usr/bin:/bin"}}
 
+    def sound(self, path):
+        """A file's samples as players have them."""
+        words = ["-i", path, "-af", "aresample=async=1:first_pts=0", "-ac", "1", "-ar", str(RATE), "-f", "s16le", "-"]
+        done = subprocess.run(["ffmpeg", "-nostdin", "-v", "error", *words], cwd=self.folder, check=True, capture_output=True)
+        return np.frombuffer(done.stdout, np.int16).astype(float)
+
+    def test_clips_start_and_end_at_the_players_time(self):
+        for name, words in CLIPPED.items():
+            self.encode(name, words)
+        (self.folder / "clips").mkdir()
+        for result in self.run_json("-m", "highlight", "-l", "5", "--clip", "clips", "."):
+            (path,) = self.folder.glob(f"clips/{result['file'][2:]}.clip.*")
+            clip, source = self.sound(path), self.sound(result["file"])
+            self.assertAlmostEqual(len(clip), (result["hl_end_ms"] - result["hl_pos_ms"]) * RATE / 1000, delta=FRAME, msg=path)
+            size = len(clip) + len(source)
+            match = np.fft.irfft(np.fft.rfft(source, size) * np.fft.rfft(clip, size).conj(), size)
+            start = (result["hl_pos_ms"] - result["offset_ms"]) * RATE / 1000
+            self.assertAlmostEqual(match.argmax(), start, delta=RATE / 1000, msg=path)
+        self.assertEqual(len(os.listdir(self.folder / "clips")), len(CLIPPED))
+
+    def test_clip_fades(self):
+        self.put("a.wav", source=SONG)
+        for name, fade in (("whole.wav", "0"), ("faded.wav", "2")):
+            self.run_tavo("-l", "5", "--fade", fade, "--clip", name, "a.wav")
+        whole, faded = self.sound("whole.wav"), self.sound("faded.wav")
+        for second, level in ((0.0, 0.05), (0.95, 0.5), (2.45, 1.0), (3.95, 0.5), (4.9, 0.025)):
+            part = slice(round(second * RATE), round((second + 0.1) * RATE))
+            self.assertAlmostEqual(faded[part] @ whole[part] / (whole[part] @ whole[part]), level, delta=0.03, msg=second)
+
+    def test_clip_that_fails_leaves_nothing(self):
+        self.put("a.wav")
+        half = self.fake('for last; do :; done; echo half > "${last#file:}"; echo no room >&2; exit 1')
+        self.run_tavo("-l", "2", "--clip", "c.mp3", "a.wav", status=1, said=b"The clip c.mp3 cannot be written. ffmpeg: no room.", **half)
+        self.run_tavo("-l", "2", "--clip", "c.txt", "a.wav", status=1, said=b"output format for 'file:c.txt'")
+        self.assert_only("a.wav", "bin")
+
     def test_decodes_what_the_library_refuses(self):
         for name, words in ENCODED.items():
             self.encode(name, words)
         self.put("notes.txt", b"This is a letter, not a song.\n" * 99)
-        results = self.run_json("--mode", "highlight", "-j", "2", ".")
+        results = self.run_json("--mode", "highlight", "-j", "2", "--report", "page.html", ".")
         self.assertEqual({r["file"][2:] for r in results}, set(ENCODED))
         for result in results:
             late = 500 if "late" in result["file"] else 0

@@ -7,7 +7,7 @@ from command_case import AS_ORDINARY_USER, Case, short_song, wav
 LABELS = ["--format", "labels"]
 ALL = (  # what writes which file for song.wav, and what is in it
     (LABELS, "song.wav.labels.txt", b"highlight"), (["--click", "c.wav"], "c.wav", b"RIFF"),
-    (["--report", "page.html"], "page.html", b"song.wav"))
+    (["--report", "page.html"], "page.html", b"song.wav"), (["--clip", "k.wav", "-l", "2"], "k.wav", b"RIFF"))
 
 
 class Outputs(Case):
@@ -41,10 +41,11 @@ class Outputs(Case):
 
     def test_places_that_cannot_be_written(self):
         before = self.song.read_bytes()
-        for option, places in (("--click", "song.wav . nowhere/c.wav"), ("--report", "song.wav ./song.wav . nowhere/page.html")):
+        for option, places in (("--click", "song.wav . nowhere/c.wav"), ("--report", "song.wav ./song.wav . nowhere/page.html"),
+                               ("--clip", "song.wav ./song.wav nowhere/c.wav")):
             for place in places.split():
-                (result,) = self.run_json("--force", option, place, "song.wav", status=1)
-                self.assertRegex(result["error"], "click|page|cannot be written", (option, place))
+                (result,) = self.run_json("--force", "-l", "2", option, place, "song.wav", status=1)
+                self.assertRegex(result["error"], "click|page|clip would|cannot be written", (option, place))
         self.put("kept/file", b"mine\n")
         for link, target, songs in (("page.html", "song.wav", 1), ("page.html", "nowhere", 2), ("page_songs", "kept", 2)):
             (self.folder / link).symlink_to(target)
@@ -63,7 +64,7 @@ class Outputs(Case):
             self.run_tavo(*arguments, "bad.wav", status=1)
             done = self.run_tavo(*arguments, "song.wav", status=1, printed=b"",
                                  preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (64, 64)))
-            self.assertRegex(done.stderr, b"cannot be written: file too large|the disk may be full")
+            self.assertRegex(done.stderr, b"cannot be written: file too large|the disk may be full|clip k.wav cannot be written")
         self.assert_only("song.wav", "silent.wav", "bad.wav")
 
     def test_another_folder(self):

@@ -22,7 +22,9 @@ USAGE = [
     ("--print x -f csv a.wav", "takes the place"),
     ("--click c.wav .", "--click takes exactly one"), ("--click c.wav --mode highlight a.wav", "needs beats"),
     ("--report p --click p a.wav", "name one file"), ("--click c.wav -", "--click takes exactly one"),
-    ("--embed a.wav", "--report"),
+    ("--embed a.wav", "--report"), ("--fade 1 a.wav", "about --clip"), ("--clip c.mp3 a.wav", "needs --length"),
+    ("--clip c.mp3 -l 9 .", "a folder for the clips"), ("--clip c -l 9 a.wav", "an ending"),
+    ("--clip c.mp3 -l 9 --fade 5 a.wav", "at most half"), ("--clip c.mp3 -l 9 --no-ffmpeg a.wav", "needs the ffmpeg"),
 ]
 REFUSED = {  # content when it is a file of ours, a part of the sentence
     "empty.wav": (b"", "empty"),

@@ -1,0 +1,23 @@
+// The highlight as an audio file, cut by the ffmpeg program: --clip.
+//
+// In: a record with a highlight (record.h) and its song. Out: a file. Called by
+// run/worker_process.h.
+#ifndef TAVO_CLI_WRITE_CLIP_H
+#define TAVO_CLI_WRITE_CLIP_H
+
+#include <string>
+
+#include "cli/input/song_file.h"
+#include "cli/options.h"
+#include "cli/run/record.h"
+
+// Where the clip of an input goes: to opts.clip, or to a name of its own in that folder, with the
+// ending of the input's kind of audio.
+std::string clip_path(const std::string &input, const options &opts);
+
+// Writes opts.length_s seconds from the highlight on, at the player's time, with opts.fade_s
+// seconds of fade at either end. What goes wrong is entered into result; target is then as before.
+void write_clip(record &result, const options &opts, const std::string &target, int stop_fd,
+                const song_file &song);
+
+#endif
