@@ -1,4 +1,4 @@
-// The decoders of all codecs: the readers have decoded already, so a frame is the finished PCM and
+// The decoders of all codecs: the readers have decoded already, so a frame is finished PCM, and
 // decoding copies it. See shared/stream.h.
 #include <cstdlib>
 #include <cstring>
@@ -15,7 +15,7 @@ struct copy_decoder {
     int32_t rate;  // Hz, as configured; AAC only
 };
 
-// channels: what the codec's readers give, the one configuration that is served.
+// channels: the output of the codec's readers, the only configuration that is supported.
 void *create(const wexa_config *config, int32_t channels, int32_t rate) {
     if (config == nullptr || config->bytes_per_sample != kSampleBytes ||
         config->output_channels != channels) {

@@ -43,7 +43,7 @@ inline std::string save(const std::string &name, const std::string &contents) {
     return path;
 }
 
-// A source. It is null when it could not be opened; error says why.
+// A source. It is null when it could not be opened; error holds the reason.
 struct opened {
     mtsrc_ctx *source = nullptr;
     int32_t error = 0;
@@ -59,7 +59,7 @@ struct opened {
     opened &operator=(const opened &) = delete;
 };
 
-// Reads up to limit samples from where the source stands. Any failure code fails the test.
+// Reads up to limit samples from the source's position. Any failure code fails the test.
 inline samples read(mtsrc_ctx *source, size_t limit = SIZE_MAX) {
     constexpr int32_t kRequest = 8192;  // bytes, the pipeline's own
     samples all;

@@ -1,5 +1,5 @@
-// Damaged files of every format: no crash, bounded time and memory, and what is far from the damage
-// comes out as before.
+// Damaged files of every format: no crash, bounded time and memory, and audio far from the damage
+// is unchanged.
 #include <sys/resource.h>
 
 #include <chrono>
@@ -14,13 +14,14 @@ using namespace std::string_literals;
 constexpr double kLongest = 10.0;             // seconds of one file
 constexpr int64_t kMostMemory = 1024 * 1024;  // KiB of the whole program
 constexpr size_t kSlack = 2 * 4608;           // samples: two of the longest frames
-constexpr size_t kRecovery = 3 * 44'100;      // behind the damage, all is as before
+constexpr size_t kRecovery =
+    3 * 44'100;  // samples after the damage until the output is bit-identical again
 constexpr int kPlaces = 3;
 
-// Whether the end of the song comes out as before, behind damage.
+// When the end of the song, after the damage, is bit-identical to the undamaged file's.
 enum end_of_song {
     kNever,    // noise that depends on the frames before
-    kInPlace,  // where nothing has moved: the file says where its pieces lie
+    kInPlace,  // if no bytes have moved: the file states offsets
     kAlways,
 };
 
@@ -49,8 +50,8 @@ std::string damaged(std::string file, int kind, size_t at, size_t run, std::mt19
     return file.replace(at, run, piece);
 }
 
-// Reads a file to its end and again behind seeks. Where it opens, duration, positions and samples
-// agree however damaged it is.
+// Reads a file to its end and again after seeks. If it opens, duration, positions and samples
+// agree, however damaged it is.
 samples read_consistently(const std::string &path, std::mt19937 *random) {
     const auto start = std::chrono::steady_clock::now();
     const opened file(path);
@@ -84,16 +85,16 @@ size_t same_end(const samples &a, const samples &b) {
     return static_cast<size_t>(differs - a.rbegin());
 }
 
-class Damage : public testing::TestWithParam<format> {};
+class DamagedFile : public testing::TestWithParam<format> {};
 
-TEST_P(Damage, StaysWhereItIs) {
+TEST_P(DamagedFile, PlaysUnchangedFarFromTheDamage) {
     SCOPED_TRACE(GetParam().file);
     std::mt19937 random(2026);
     const std::string file = load(fixture(GetParam().file));
     const samples whole = read_all(fixture(GetParam().file));
     for (int place = 0; place < kPlaces; ++place) {
         const size_t at = file.size() / 4 + random() % (file.size() / 4);
-        // What a file that ends there has is what it has of the whole one.
+        // A file that ends there has the start of the whole one.
         const samples cut = read_consistently(save("cut", file.substr(0, at)), &random);
         ASSERT_GT(cut.size(), whole.size() / 10);
         ASSERT_LT(cut.size(), whole.size() * 3 / 4);
@@ -112,7 +113,7 @@ TEST_P(Damage, StaysWhereItIs) {
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(Formats, Damage,
+INSTANTIATE_TEST_SUITE_P(Formats, DamagedFile,
                          testing::Values(format{"song.wav", kInPlace},
                                          format{"no_table.flac", kAlways},
                                          format{"cbr.mp3", kAlways}, format{"layer2.mp2", kAlways},
@@ -120,11 +121,11 @@ INSTANTIATE_TEST_SUITE_P(Formats, Damage,
                                          format{"fragmented.mp4", kNever},
                                          format{"song.ogg", kAlways}));
 
-// Counts that say far more than the file can hold.
-TEST(Claims, OfTooMuchAreNotBelieved) {
+// Counts that state far more than the file can hold.
+TEST(Claims, ImpossibleCountsAreNotBelieved) {
     const std::string kMost = "\x7F\xFF\xFF\xFF";
     const struct {
-        const char *file, *behind;
+        const char *file, *mark;
         size_t at;
         std::string value;
     } claims[] = {
@@ -139,9 +140,9 @@ TEST(Claims, OfTooMuchAreNotBelieved) {
     };
     std::mt19937 random(3);
     for (const auto &each : claims) {
-        SCOPED_TRACE(std::string(each.file) + ", " + each.behind);
+        SCOPED_TRACE(std::string(each.file) + ", " + each.mark);
         std::string file = load(fixture(each.file));
-        const size_t found = file.find(each.behind);
+        const size_t found = file.find(each.mark);
         ASSERT_NE(found, std::string::npos);
         file.replace(found + each.at, each.value.size(), each.value);
         const samples got = read_consistently(save("claim", file), &random);

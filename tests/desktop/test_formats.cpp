@@ -1,4 +1,4 @@
-// What every format's reader owes, on the files of the fixtures.
+// The readers of every format, on the fixtures' files.
 #include <cstdlib>
 #include <cstring>
 
@@ -9,12 +9,12 @@ namespace {
 
 using namespace std::string_literals;
 
-class Seams : public testing::TestWithParam<const char *> {};
+class Seek : public testing::TestWithParam<const char *> {};
 
-// A seek reports the first sample at or after its position and delivers from there what a linear
-// read delivers. The last quarter has no more than a quarter: four parts have the whole stream.
-TEST_P(Seams, AreExact) {
-    constexpr ptrdiff_t kSeamSamples = 30'000;  // compared behind each seek
+// A seek reports the first sample at or after its position; from there the output is bit-identical
+// to a linear read. The last quarter has no more than a quarter: four parts have the whole stream.
+TEST_P(Seek, ReachesTheRequestedSample) {
+    constexpr ptrdiff_t kSeamSamples = 30'000;  // compared after each seek
     SCOPED_TRACE(GetParam());
     const samples linear = read_all(fixture(GetParam()));
     const opened file(fixture(GetParam()));
@@ -39,7 +39,7 @@ TEST_P(Seams, AreExact) {
         const int64_t sample = reached * rate / kUnits;
         const int64_t left = static_cast<int64_t>(linear.size()) - sample;
         ASSERT_GE(left, 0);
-        // A position lies at most one sample before the one reached, but for the stream's end.
+        // The position is at most one sample before the one reached, except at the stream's end.
         ASSERT_TRUE(reached >= position || left == 0) << reached;
         ASSERT_LT(std::max<int64_t>(reached - position - 1, 0) * rate, kUnits) << reached;
         ASSERT_EQ(mtsrc_seekstream(file.source, reached, &again), 0);
@@ -52,7 +52,7 @@ TEST_P(Seams, AreExact) {
 }
 
 INSTANTIATE_TEST_SUITE_P(
-    Files, Seams,
+    Files, Seek,
     testing::Values("cbr.mp3", "cbr48.mp3", "vbr.mp3", "vbr_no_table.mp3", "checked.mp3",
                     "mono.mp3", "lsf.mp3", "low.mp3", "layer2.mp2", "golden/layer1_44.mp1",
                     "golden/layer1_48.mp1", "song.flac", "no_table.flac", "mono.flac", "six.flac",
@@ -62,7 +62,7 @@ INSTANTIATE_TEST_SUITE_P(
                     "layer3.mp4", "stereo3.mp4", "golden/he.m4a", "song.ogg", "mono.ogg", "six.ogg",
                     "video.ogv", "golden/late.ogg", "golden/front.ogg", "golden/end.ogg"));
 
-TEST(Files, HoldTheSameSamples) {
+TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
     const struct {
         const char *file, *like;
         size_t front = 0, end = 0;  // samples of the second that the first lacks
@@ -74,7 +74,7 @@ TEST(Files, HoldTheSameSamples) {
         {"six.flac", "six.wav"},
         {"golden/late.flac", "golden/plain.flac"},
         {"golden/variable.flac", "golden/plain.flac", 0, 1408},
-        // The frame with the encoder's table is no music.
+        // The frame with the encoder's table is skipped.
         {"vbr.mp3", "vbr_no_table.mp3"},
         // The same frames, however they are packed and whatever is beside them.
         {"golden/program.aac", "golden/plain.aac"},
@@ -87,7 +87,7 @@ TEST(Files, HoldTheSameSamples) {
         {"video.ogv", "song.ogg"},
         // Of a mono stream the bare source drops nothing and averages nothing.
         {"layer3.mp4", "mono.mp3"},
-        // Vorbis is cut where its granule positions say.
+        // Vorbis is cut at its granule positions.
         {"golden/late.ogg", "golden/plain.ogg"},
         {"golden/front.ogg", "golden/plain.ogg", 700},
         {"golden/end.ogg", "golden/plain.ogg", 0, 700},
@@ -122,7 +122,7 @@ samples mixed(const std::string &song, const std::string &channels) {
 
 // Also where a new decoder starts, every few seconds. The files have no substituted noise. One is
 // too loud for 16 bits, one has blocks that no buffer of the source can hold.
-TEST(Files, ComeOutAsFfmpegDecodesThem) {
+TEST(Reader, AgreesWithFfmpeg) {
     const struct {
         const char *file, *like, *channels;
         int off = 1;         // a sample may be, where the channels are mixed or the codec is lossy
@@ -150,7 +150,7 @@ TEST(Files, ComeOutAsFfmpegDecodesThem) {
 }
 
 // The second channel of a pair, which the source leaves out.
-TEST(Flac, GivesBothChannels) {
+TEST(Flac, DeliversBothChannels) {
     const std::string path = fixture("song.flac");
     const mtsrc_io io = io_for(path);
     xflac_info info = {};
@@ -166,8 +166,8 @@ TEST(Flac, GivesBothChannels) {
     expect_same(right, mixed("song.wav", "=c1"));
 }
 
-// The headers say 22,050 Hz; decoding says 44,100 Hz, 2048 samples a frame.
-TEST(Aac, LearnsTheTruthFromTheFrames) {
+// The headers state 22,050 Hz; decoding gives 44,100 Hz, 2048 samples a frame.
+TEST(Aac, RateAndChannelsComeFromTheFrames) {
     for (const char *name : {"golden/he_every.aac", "golden/he.aac", "golden/he.m4a"}) {
         const opened file(fixture(name));
         ASSERT_NE(file.source, nullptr) << name;
@@ -182,7 +182,7 @@ TEST(Aac, LearnsTheTruthFromTheFrames) {
 }
 
 // The readers' blocks come in pieces; recognition asks for less and needs it at once.
-TEST(Files, MayDeliverLessThanAsked) {
+TEST(Reader, AcceptsShortReads) {
     for (const char *name :
          {"song.wav", "cbr.mp3", "song.flac", "low.aac", "last.m4a", "song.ogg"}) {
         SCOPED_TRACE(name);
@@ -201,10 +201,11 @@ TEST(Files, MayDeliverLessThanAsked) {
 }
 
 // Tags and garbage that bare streams are found in.
-TEST(Files, AreFoundAmongTagsAndGarbage) {
+TEST(Reader, SkipsTagsAndGarbage) {
     std::string file = load(fixture("vbr.mp3"));
     const samples plain = read_all(fixture("vbr_no_table.mp3"));
-    constexpr size_t kTable = 36;  // behind the side information of MPEG-1 stereo; VBRI's place too
+    constexpr size_t kTable =
+        36;  // after the side information of MPEG-1 stereo; also VBRI's offset
     ASSERT_EQ(file.substr(kTable, 4), "Xing");
     for (const char *name : {"Info", "VBRI"})
         expect_same(read_all(save("table.mp3", file.replace(kTable, 4, name))), plain);
@@ -233,7 +234,7 @@ TEST(Files, AreFoundAmongTagsAndGarbage) {
 }
 
 // Other codecs, and files that have nothing of a format but its first bytes.
-TEST(Files, ThatCannotBeReadAreRefused) {
+TEST(Reader, RefusesOtherCodecsAndNoise) {
     EXPECT_EQ(opened(fixture("alac.m4a")).error, -3);
     EXPECT_EQ(opened(fixture("silent.mp4")).error, -7);
     EXPECT_EQ(opened(fixture("opus.ogg")).error, -7);

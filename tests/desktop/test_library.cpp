@@ -13,9 +13,9 @@ namespace {
 
 using namespace std::string_literals;
 
-// The readers have decoded already: a decoder hands out what it gets, in the one form that its
-// reader gives. Only Vorbis takes set-up data, and only with its mark.
-TEST(Decoder, ServesOneConfiguration) {
+// The readers have decoded already: a decoder copies its input, in the one configuration of its
+// reader. Only Vorbis accepts set-up data, and only with its mark.
+TEST(Decoder, SupportsOneConfiguration) {
     const wexa_config three_bytes = {1, 2, 3, 0}, mono = {1, 1, 2, 0};
     EXPECT_EQ(xflacd_create(&three_bytes, nullptr), nullptr);
     EXPECT_EQ(xflacd_create(&mono, nullptr), nullptr);
@@ -37,8 +37,8 @@ bool has_libavcodec() {
     return load("/proc/self/maps").find("libavcodec") != std::string::npos;
 }
 
-// WAV and FLAC do without libavcodec; the first four sources that need it open at once. Behind
-// other cases, in a process of its own.
+// WAV and FLAC do without libavcodec; the first four sources that need it open at once. If
+// libavcodec is loaded already, in a process of its own.
 TEST(Library, LoadsLibavcodecWhenNeeded) {
     if (has_libavcodec()) {
         const std::string self = std::filesystem::read_symlink("/proc/self/exe");
@@ -58,8 +58,8 @@ TEST(Library, LoadsLibavcodecWhenNeeded) {
     EXPECT_TRUE(has_libavcodec());
 }
 
-// A copy of the library without the shared object beside it.
-TEST(Library, NamesWhatIsMissing) {
+// A copy of the library without its shared object in the same folder.
+TEST(Library, LogsAMissingObject) {
     Dl_info info = {};
     ASSERT_NE(dladdr(reinterpret_cast<void *>(xaac_init), &info), 0);
     const std::string copy = save("libwexaaudio.so", load(info.dli_fname));

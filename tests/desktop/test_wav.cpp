@@ -61,7 +61,7 @@ TEST(Wav, ReadsEveryShapeOfHeader) {
     }
 }
 
-// Where the header says anything, an unusable format is told from unusable data.
+// If the header is readable, an unusable format is distinguished from unusable data.
 TEST(Wav, RefusesWhatTheSourceCannotUse) {
     const std::string file = support::wav_bytes(numbers(2000), 44100, 2);
     const auto coded = [&](uint64_t tag, uint64_t bits) {

@@ -1,6 +1,6 @@
 /* The Android log's writing function, for a desktop: lines go to standard error with priority
  * letter and tag, from priority 6 (error) up unless the environment variable TAVO_LOG names a lower
- * one ("verbose", "debug"). On Android the platform's own header and library take this one's place.
+ * one ("verbose", "debug"). On Android the platform's own header and library replace these.
  */
 #ifndef TAVO_DESKTOP_LOG_ANDROID_LOG_H
 #define TAVO_DESKTOP_LOG_ANDROID_LOG_H

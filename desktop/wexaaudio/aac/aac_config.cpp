@@ -14,7 +14,7 @@ constexpr int32_t kObjectEscape = 31;          // 6 more bits follow
 
 struct bit_reader {
     const uint8_t *data;
-    int64_t bits;  // in all
+    int64_t bits;  // in data
     int64_t at;
     bool failed;  // read past the end
 };

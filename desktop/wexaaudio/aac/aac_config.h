@@ -1,4 +1,4 @@
-// The AudioSpecificConfig of an AAC stream: what a decoder must be told before raw blocks.
+// The AudioSpecificConfig of an AAC stream, which a decoder needs before raw blocks.
 //
 // In: fields of an ADTS header, or the configuration that an MP4 track carries. Out: bytes
 // for the decoder's set-up data.
@@ -17,7 +17,7 @@ struct aac_config {
     uint8_t bytes[kAacMaxConfig];
     int32_t size;
     int32_t object_type;  // as stated: kAacSbr and kAacPs where they are explicit
-    int32_t rate_index;   // of the core, 0 to 12; 15: none of the table's
+    int32_t rate_index;   // of the core, 0 to 12; 15: not in the table
     int32_t channels;     // the channel configuration, 0: given by a program configuration
     bool short_frames;    // 960 samples a frame instead of 1024
 };
@@ -25,7 +25,7 @@ struct aac_config {
 // Sampling rate of a table index, Hz; 0 for an index without one.
 int32_t aac_rate_of_index(int32_t index);
 
-// For a stream whose headers state all that there is. channels 1 to 15.
+// For a stream whose headers state everything. channels: 1 to 15.
 void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index, int32_t channels);
 
 // For a stream whose channels are stated by the program configuration element at the start of data,
@@ -33,12 +33,12 @@ void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index
 bool aac_config_from_program(aac_config *config, const uint8_t *data, int32_t bytes,
                              int32_t object_type, int32_t rate_index);
 
-// Takes over a configuration and reads its first fields. False when it is too long or too short.
+// Copies a configuration and reads its first fields. False when it is too long or too short.
 bool aac_config_read(aac_config *config, const void *data, int32_t bytes);
 
-// Says explicitly that the stream carries spectral band replication (and, parametric, stereo from
-// one channel). Without that, a decoder started at a frame without such data goes on without it.
-// Nothing is done to a configuration that is not a plain low-complexity one.
+// States explicitly that the stream carries spectral band replication (and, parametric, stereo from
+// one channel). Without that, a decoder that starts at a frame without such data never applies it.
+// A configuration that is not a plain low-complexity one is left unchanged.
 void aac_config_make_sbr(aac_config *config, bool parametric);
 
 #endif

@@ -6,32 +6,33 @@ namespace {
 
 // The core of a stream with spectral band replication has at most half of 48,000 Hz.
 constexpr int32_t kMaxSbrCore = 24000;
-constexpr int32_t kSbrFrames = 8;     // frames looked at for band replication; all carry it usually
-constexpr int32_t kLearnFrames = 64;  // frames tried until one decodes at all
+constexpr int32_t kSbrFrames = 8;     // decoded in search of band replication; usually all have it
+constexpr int32_t kTriedFrames = 64;  // frames tried until one decodes at all
 
 constexpr int32_t kMaxFrameSamples = 4096;  // as 16-bit pairs well within a source's frame buffer
 constexpr int32_t kMaxBlockBytes = 8191;    // what an ADTS header can state, beyond any real block
 
-// Opening a decoder costs as much as decoding several frames, which speaks for large groups; a seek
-// decodes half a group on average, which speaks for small ones.
+// Opening a decoder costs as much as decoding several frames, which favours large groups; a seek
+// decodes half a group on average, which favours small ones.
 //
-// One frame settles the overlap of low complexity. Band replication has filters and envelopes with
-// a longer memory, and its set-up may come with every tenth frame only: 8 frames can be heard. The
-// prediction of other object types remembers more than one frame as well.
+// One frame suffices for the overlap of low complexity. Band replication has filters and envelopes
+// with a longer memory, and its header may come with every tenth frame only: with a preroll of 8
+// frames the difference is audible. The prediction of other object types remembers more than one
+// frame as well.
 constexpr int32_t kGroup = 256;
 constexpr int32_t kPreroll = 1;
 constexpr int32_t kLongPreroll = 12;
 
-struct learned {
+struct block_output {
     int32_t samples;  // sample frames of a block; 0: it does not decode
     int32_t rate;     // Hz
     int32_t channels;
 };
 
 // Decodes a frame alone with a fresh decoder.
-learned decode_alone(io_file *file, const aac_config *config, const frame_entry &entry) {
+block_output decode_alone(io_file *file, const aac_config *config, const frame_entry &entry) {
     const codec_library *library = codec_library_get();
-    learned got = {};
+    block_output got = {};
     av_decoder *d = library->open("aac", config->bytes, config->size);
     uint8_t *packet = d != nullptr && entry.bytes > 0 && entry.bytes <= kMaxBlockBytes
                           ? library->packet(d, entry.bytes)
@@ -45,13 +46,13 @@ learned decode_alone(io_file *file, const aac_config *config, const frame_entry 
 }
 
 // The output of the first frames; of those that decode, the one with the highest rate.
-learned learn_output(io_file *file, const aac_config *config, const frame_index *frames) {
-    learned best = {};
+block_output find_output(io_file *file, const aac_config *config, const frame_index *frames) {
+    block_output best = {};
     const int32_t core_rate = aac_rate_of_index(config->rate_index);
     const bool may_have_sbr =
         config->object_type == kAacLowComplexity && core_rate > 0 && core_rate <= kMaxSbrCore;
-    for (int64_t k = 0; k < std::min<int64_t>(frames->count, kLearnFrames); ++k) {
-        const learned got = decode_alone(file, config, frames->entry[k]);
+    for (int64_t k = 0; k < std::min<int64_t>(frames->count, kTriedFrames); ++k) {
+        const block_output got = decode_alone(file, config, frames->entry[k]);
         if (got.samples > 0 && got.samples <= kMaxFrameSamples && got.rate > best.rate) best = got;
         const bool sure = !may_have_sbr || best.rate > core_rate || k + 1 >= kSbrFrames;
         if (best.rate > 0 && sure) break;
@@ -61,8 +62,8 @@ learned learn_output(io_file *file, const aac_config *config, const frame_index 
 
 }  // namespace
 
-bool aac_stream_learn(io_file *file, aac_config *config, stream_info *info) {
-    const learned output = learn_output(file, config, &info->frames);
+bool aac_stream_complete(io_file *file, aac_config *config, stream_info *info) {
+    const block_output output = find_output(file, config, &info->frames);
     if (output.rate <= 0) return false;
     const bool sbr = output.rate == 2 * aac_rate_of_index(config->rate_index);
     if (sbr) aac_config_make_sbr(config, config->channels == 1 && output.channels == 2);

@@ -1,6 +1,6 @@
 // The raw blocks of one AAC track, shared by the ADTS reader and the MP4 demuxer.
 //
-// In: where each raw block lies in the file, the configuration. Out: a stream whose blocks all have
+// In: where each raw block is in the file, the configuration. Out: a stream whose blocks all have
 // one length.
 //
 // A decoder's noise generator carries history, so the same block decoded after a seek would differ
@@ -12,10 +12,10 @@
 #include "desktop/wexaaudio/aac/aac_config.h"
 #include "desktop/wexaaudio/shared/stream.h"
 
-// With the frames in the index: decodes the first to learn what the headers do not say (or say
-// wrongly), makes the configuration explicit, gives all frames their length and chooses the groups.
-// A block longer than any can be becomes silence. False when nothing there decodes or out of
-// memory.
-bool aac_stream_learn(io_file *file, aac_config *config, stream_info *info);
+// Completes a stream whose frames are in the index: decodes the first ones to find what the headers
+// do not state (or state wrongly), makes the configuration explicit, gives all frames their length
+// and chooses the groups. A block of impossible length becomes silence. False when nothing there
+// decodes or out of memory.
+bool aac_stream_complete(io_file *file, aac_config *config, stream_info *info);
 
 #endif

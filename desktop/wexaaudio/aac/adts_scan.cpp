@@ -20,7 +20,7 @@ struct adts_header {
     int32_t bytes;  // of the frame
 };
 
-// False when there is no header, or one of several raw blocks, which have no lengths.
+// False when there is no header, or one that announces several raw blocks, whose lengths it lacks.
 bool header_at(io_file *file, int64_t offset, adts_header *h) {
     const uint8_t *p = io_file_bytes(file, offset, kHeaderBytes);
     if (p == nullptr || p[0] != 0xFF || (p[1] & 0xF6) != 0xF0) return false;
@@ -37,11 +37,12 @@ bool same_stream(const adts_header &a, const adts_header &b) {
     return a.object_type == b.object_type && a.rate_index == b.rate_index;
 }
 
-// The next frame of the stream at or after offset, vouched for by a second one or the end of the
-// file right behind it. With like null any stream will do. Returns its offset, -1 when none.
+// The next frame of the stream at or after offset, confirmed by a second one or the end of the
+// file right after it. like: a frame of the stream, null for any stream. Returns its offset, -1
+// when there is none.
 int64_t find_frame(io_file *file, int64_t offset, const adts_header *like, adts_header *h) {
     for (;; ++offset) {
-        int32_t got = 0;  // the frame and the header behind it are in the buffer, whatever it says
+        int32_t got = 0;  // the frame and the next header are in the buffer, whatever its length
         const uint8_t *p = io_file_peek(file, offset, kMaxFrameBytes + kHeaderBytes, &got);
         if (p == nullptr) return -1;
         const void *sync = memchr(p, 0xFF, static_cast<size_t>(got));
@@ -70,7 +71,7 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
         if (header_at(file, end, &next) && same_stream(next, *first)) {
             offset = end;
         } else {
-            // Damage: the header sought may also lie within a frame whose stated length is wrong.
+            // Damage: the next header may also be inside a frame whose stated length is wrong.
             offset = find_frame(file, offset + h.head, first, &next);
             frame_entry &last = frames->entry[frames->count - 1];
             if (offset >= 0 && offset < end) {
@@ -101,7 +102,7 @@ bool scan_file(io_file *file, void *result) {
     adts_header first = {};
     return scan_frames(file, id3v2_end(file), &info->frames, &first) &&
            make_config(file, first, info->frames.entry[0], &config) &&
-           aac_stream_learn(file, &config, info);
+           aac_stream_complete(file, &config, info);
 }
 
 }  // namespace

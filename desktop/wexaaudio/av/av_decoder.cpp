@@ -1,4 +1,4 @@
-// libwexaaudio_av.so: what of the stand-in calls libavcodec. See shared/codec_library.h.
+// libwexaaudio_av.so: the part of the library that calls libavcodec. See shared/codec_library.h.
 #include <pthread.h>
 
 #include <algorithm>
@@ -19,16 +19,16 @@ struct av_decoder {
     AVCodecContext *ctx;
     AVPacket *packet;
     AVFrame *frame;  // what the last packet decoded to
-    AVFrame *spare;  // takes what a packet gives beyond its first frame
+    AVFrame *spare;  // receives further frames of a packet
 };
 
 namespace {
 
-constexpr size_t kMaxBlock = size_t{128} << 20;  // bytes that libavutil gives out at once
+constexpr size_t kMaxBlock = size_t{128} << 20;  // bytes that libavutil allocates at once
 
 pthread_once_t prepare_once = PTHREAD_ONCE_INIT;
 
-// For the whole process: no words on standard error, no huge blocks for damaged counts.
+// For the whole process: no messages on standard error, no huge blocks for damaged counts.
 void prepare() {
     av_log_set_level(AV_LOG_QUIET);
     av_max_alloc(kMaxBlock);
@@ -101,7 +101,7 @@ int32_t decode(av_decoder *d) {
     int result = avcodec_send_packet(d->ctx, d->packet);
     if (result == 0) result = avcodec_receive_frame(d->ctx, d->frame);
     if (result == AVERROR(EAGAIN)) return 0;
-    // A damaged packet may hold more than its frame: what is left must not come out with the next.
+    // A damaged packet may hold several frames: the rest must not be output with the next packet.
     while (result == 0 && avcodec_receive_frame(d->ctx, d->spare) == 0) av_frame_unref(d->spare);
     if (result == 0 && is_audio(d->frame)) return d->frame->nb_samples;
     av_frame_unref(d->frame);

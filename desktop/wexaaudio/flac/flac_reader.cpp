@@ -1,5 +1,5 @@
 // FLAC files, decoded by libFLAC. Positions are the sample numbers of the frames, so that a frame
-// that is missing or does not decode leaves silence of its length.
+// that is missing or cannot be decoded becomes silence of its length.
 //
 // In: mtsrc_io. Out: front left and right as 16-bit pairs, one channel twice; the information
 // record.
@@ -17,9 +17,9 @@
 namespace {
 
 constexpr int32_t kPair = 2 * sizeof(int16_t);  // bytes
-constexpr int64_t kTail = 65'536;               // bytes of the file's end looked at first
+constexpr int64_t kTail = 65'536;  // bytes at the file's end, decoded first to find the last block
 
-// Sample frames that a byte of the file is believed to stand for. Digital silence has 290 in the
+// Sample frames believed for each byte of the file. Digital silence has 290 in the
 // encoder's default blocks of 4096, and 1200 in the largest blocks of a streamable file.
 constexpr int64_t kMaxSamplesPerByte = 2048;
 
@@ -52,7 +52,7 @@ struct flac_reader {
     flac_stream stream;
     const flac_extent *extent;  // shared by the readers of the file
     int64_t next;               // sample delivered next
-    bool moved;                 // a seek came, and the decoder is elsewhere
+    bool moved;                 // after a seek, until the decoder follows
 };
 static_assert(offsetof(flac_reader, flag) == kFlacReaderFlag);
 
@@ -126,7 +126,7 @@ void store_pairs(const FLAC__int32 *left, const FLAC__int32 *right, int32_t bits
     });
 }
 
-// A frame with a wrong check sum is not taken: not even its number can be trusted.
+// Ignores a frame with a wrong check sum: not even its number can be trusted.
 FLAC__StreamDecoderWriteStatus store_block(const FLAC__StreamDecoder * /*decoder*/,
                                            const FLAC__Frame *frame,
                                            const FLAC__int32 *const buffer[], void *client) {
@@ -181,7 +181,7 @@ bool rewind_stream(flac_stream *s) {
            FLAC__stream_decoder_process_until_end_of_metadata(s->decoder) != 0;
 }
 
-// Decodes the block that holds a sample; the block then starts there. False where none holds it.
+// Decodes the block that holds a sample and makes it start there. False when there is none.
 bool find_sample(flac_stream *s, int64_t sample) {
     s->count = 0;
     s->damaged = false;
@@ -204,8 +204,8 @@ int64_t last_end(flac_stream *s, int64_t offset) {
     return end;
 }
 
-// Where the audio that is there ends, which need not be where the stream information says: at the
-// end of the last block, searched from the file's end. False where it has no end to be believed.
+// Finds where the audio ends, which may differ from the stream information: at the end of the last
+// block, searched from the file's end. False when there is no plausible end.
 bool find_end(flac_stream *s, int64_t *end) {
     const int64_t size = s->file->size;
     for (int64_t tail = kTail; *end == 0 && !s->file->failed; tail *= 4) {
@@ -260,7 +260,7 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     flac_stream *s = &r->stream;
     if (r->next >= r->extent->end) return kWexaEndOfStream;
     if (r->moved && !find_sample(s, r->next)) {
-        // Where no seek leads, reading goes on from the start, up to the place.
+        // Where seeking fails, the stream is read from the start up to the position.
         r->file.failed = false;
         if (!rewind_stream(s)) return -1;
     }

@@ -8,9 +8,9 @@
 
 namespace {
 
-constexpr int32_t kMaxBoxes = 65536;    // of one level; a file that has more is no song
+constexpr int32_t kMaxBoxes = 65536;    // of one level; real files have far fewer
 constexpr int64_t kFullHead = 4;        // bytes: version and flags of a box that has them
-constexpr int64_t kMaxTable = 1 << 26;  // bytes; more than the frames of a day take
+constexpr int64_t kMaxTable = 1 << 26;  // bytes; a day of frames needs less
 
 // Bytes of the file for each frame that it is believed to have. The shortest AAC frame of silence
 // has 4, and 4 more in the tables; frames that share their bytes would take memory without limit.
@@ -22,7 +22,7 @@ constexpr uint32_t name_of(const char (&text)[5]) {
     return name;
 }
 
-// Where a box's contents lie, or a level of boxes; from == to: it is not there.
+// The offsets of a box's contents, or of a level of boxes; from == to: it does not exist.
 struct span {
     int64_t from;
     int64_t to;
@@ -47,7 +47,7 @@ struct parser {
     uint32_t track_id;                   // of the audio track
     frame_default defaults[kMaxTracks];  // default_count used
     int32_t default_count;
-    bool ended;  // a frame was not there: the list ends before it
+    bool ended;  // a frame was past the end of the file: the list ends before it
 };
 
 // Unsigned, big-endian; 0 where the file has no such bytes.
@@ -62,18 +62,18 @@ uint32_t be32(io_file *file, int64_t offset) {
     return static_cast<uint32_t>(number(file, offset, 4));
 }
 
-// Takes the next box off the front of a level; one that says to be longer than the level ends with
-// it. False when there is none.
+// Removes the next box from the front of a level; one that states that it is longer than the level
+// ends with it. False when there is none.
 bool next_box(io_file *file, span *level, box *b) {
-    const int64_t room = level->to - level->from;
-    if (room < 8) return false;
+    const int64_t left = level->to - level->from;
+    if (left < 8) return false;
     uint64_t size = be32(file, level->from);
     int64_t head = 8;
     if (size == 1) {
         size = number(file, level->from + 8, 8);
         head = 16;
     }
-    if (size == 0 || size > static_cast<uint64_t>(room)) size = static_cast<uint64_t>(room);
+    if (size == 0 || size > static_cast<uint64_t>(left)) size = static_cast<uint64_t>(left);
     if (static_cast<int64_t>(size) < head) return false;
     *b = {be32(file, level->from + 4),
           level->from,
@@ -155,10 +155,10 @@ bool add_frame(parser *p, int64_t offset, int64_t bytes) {
                         frame_index_add(frames, offset, static_cast<int32_t>(bytes), 0));
 }
 
-// A table box's contents behind version and flags, in memory: the tables are read in step, and may
-// lie far apart.
+// A table box's contents after version and flags, in memory: the tables are read in parallel and
+// may be far apart.
 struct table {
-    uint8_t *data;  // owned; null when it is not there, too long, or out of memory
+    uint8_t *data;  // owned; null when missing, too long, or out of memory
     int64_t bytes;
 };
 
@@ -172,7 +172,7 @@ table load(io_file *file, span body) {
     return t;
 }
 
-// Unsigned, big-endian, of width bytes; 0 behind the end.
+// Unsigned, big-endian, of width bytes; 0 past the end.
 int64_t value(const table &t, int64_t at, int32_t width) {
     uint64_t v = 0;
     if (at < 0 || at + width > t.bytes) return 0;
@@ -180,8 +180,7 @@ int64_t value(const table &t, int64_t at, int32_t width) {
     return static_cast<int64_t>(v);
 }
 
-// The tables of a track: how many frames lie in each chunk, where the chunks lie, the frames'
-// sizes.
+// The tables of a track: how many frames each chunk has, where the chunks are, the frames' sizes.
 struct tables {
     table runs;    // "stsc": count; first chunk, frames in each, description (32 bits each)
     table chunks;  // "stco", "co64": count; offsets of chunk_width
@@ -203,8 +202,8 @@ tables load_tables(io_file *file, span stbl) {
     t.size_bits = same > 0 ? 0 : plain.to > 0 ? 32 : static_cast<int32_t>(value(t.sizes, 3, 1));
     t.count = value(t.sizes, 4, 4);
     if (same == 0) {
-        const int64_t room = t.size_bits >= 4 ? (t.sizes.bytes - 8) * 8 / t.size_bits : 0;
-        t.count = std::min(t.count, room);
+        const int64_t fitting = t.size_bits >= 4 ? (t.sizes.bytes - 8) * 8 / t.size_bits : 0;
+        t.count = std::min(t.count, fitting);
     }
     return t;
 }
@@ -287,8 +286,8 @@ bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64
     return true;
 }
 
-// All runs of one track of a fragment. *offset: where its frames lie unless it says otherwise;
-// moves on behind them.
+// Reads all runs of one track of a fragment. *offset: where its frames start unless it states
+// otherwise; moves to their end.
 bool read_track_runs(parser *p, int64_t moof, span traf, int64_t *offset) {
     io_file *file = p->file;
     const span head = find(file, traf, name_of("tfhd"));
@@ -323,7 +322,7 @@ bool read_fragment(parser *p, const box &moof) {
     return true;
 }
 
-// Kinds of the tracks, and the tables of the first audio track.
+// Reads the kinds of the tracks and the tables of the first audio track.
 bool read_movie(parser *p, span moov) {
     io_file *file = p->file;
     stream_info *info = p->info;

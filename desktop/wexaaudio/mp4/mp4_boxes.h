@@ -1,6 +1,6 @@
-// What an MP4 file says about its tracks: the kinds of all, and of the first audio track its codec
-// and the place of every frame, from the tables of the movie box and of its fragments. Edit lists
-// are not looked at.
+// What an MP4 file states about its tracks: the kinds of all, and for the first audio track its
+// codec and the offset of every frame, from the tables of the movie box and of its fragments. Edit
+// lists are ignored.
 //
 // In: the file. Out: the frames (without their lengths in samples) and the codec.
 // After: mp4_demux.cpp.
@@ -16,7 +16,7 @@ struct mp4_codec {
     aac_config config;  // of AAC
 };
 
-// Frames that the file is too short for, and all after them, are left out. False when the file has
+// Frames past the end of the file, and all after them, are left out. False when the file has
 // no movie box, cannot be read, or memory runs out.
 bool mp4_read_boxes(io_file *file, stream_info *info, mp4_codec *codec);
 

@@ -12,14 +12,14 @@
 
 namespace {
 
-// Frames looked at for a header that says rate and length; the first one has it unless damaged.
-constexpr int64_t kLearnFrames = 64;
+// Frames searched for a header that states rate and length; the first one has it unless damaged.
+constexpr int64_t kTriedFrames = 64;
 
 // Rate, channels and frame length of a Layer III track come from its frames: all have one length.
-bool learn_mpeg(io_file *file, stream_info *info) {
+bool read_mpeg_format(io_file *file, stream_info *info) {
     mpeg_header h = {};
     bool known = false;
-    for (int64_t k = 0; k < std::min(info->frames.count, kLearnFrames) && !known; ++k) {
+    for (int64_t k = 0; k < std::min(info->frames.count, kTriedFrames) && !known; ++k) {
         const uint8_t *p = io_file_bytes(file, info->frames.entry[k].offset, kMpegHeaderBytes);
         known = p != nullptr && mpeg_parse(p, &h) && h.layer == 3;
     }
@@ -36,8 +36,8 @@ bool scan_file(io_file *file, void *result) {
     auto *info = static_cast<stream_info *>(result);
     mp4_codec codec = {};
     if (!mp4_read_boxes(file, info, &codec)) return false;
-    if (codec.is_aac) return aac_stream_learn(file, &codec.config, info);
-    return !codec.is_mpeg || learn_mpeg(file, info);  // the source refuses any other codec
+    if (codec.is_aac) return aac_stream_complete(file, &codec.config, info);
+    return !codec.is_mpeg || read_mpeg_format(file, info);  // the source refuses any other codec
 }
 
 constexpr scan_kind kScan = {sizeof(stream_info), scan_file, stream_info_release};

@@ -70,7 +70,7 @@ bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes) {
     if (h->layer != 3) {
         return false;
     }
-    // Some encoders leave the check sum out of account when they place the table.
+    // Some encoders ignore the check sum when they place the table.
     const int32_t at = mpeg_main_data_at(h);
     for (const int32_t place : {at, h->has_crc ? at - 2 : at}) {
         if (place + 4 <= bytes &&

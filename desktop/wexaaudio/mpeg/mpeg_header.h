@@ -1,5 +1,5 @@
 // The four bytes that start every MPEG audio frame (ISO/IEC 11172-3, 13818-3 and its 2.5
-// extension), and what of a frame's body the reader must know.
+// extension), and the parts of a frame's body that the reader needs.
 #ifndef WEXAAUDIO_MPEG_HEADER_H
 #define WEXAAUDIO_MPEG_HEADER_H
 
@@ -18,10 +18,10 @@ struct mpeg_header {
     int32_t channels;  // 1 or 2
     int32_t samples;   // sample frames
     int32_t bytes;     // of the frame
-    bool has_crc;      // two bytes behind the header
+    bool has_crc;      // two bytes after the header
 };
 
-// False when the four bytes are no header, or one of free format, which has no length.
+// False when the four bytes are not a header, or one of free format, which states no length.
 bool mpeg_parse(const uint8_t *p, mpeg_header *h);
 
 // Same version, layer and rate: frames of one stream.
@@ -30,11 +30,11 @@ bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
 // Bytes from a Layer III frame's start to its main data.
 int32_t mpeg_main_data_at(const mpeg_header *h);
 
-// Whether a stream's first frame carries an encoder's table (Xing, Info, VBRI) in place of music. p
+// True if a stream's first frame holds an encoder's table (Xing, Info, VBRI) instead of music. p
 // holds the frame, bytes of it.
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
 
-// How a stream of such frames is decoded, whatever holds it.
+// Fills in how a stream of such frames is decoded, bare or in a container.
 void mpeg_describe(const mpeg_header *head, stream_info *info);
 
 #endif

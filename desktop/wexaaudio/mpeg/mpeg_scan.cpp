@@ -13,7 +13,7 @@ constexpr int32_t kDropRate = 44100;  // Hz
 
 constexpr int32_t kId3v1Bytes = 128;
 constexpr int32_t kApeFooter = 32;            // bytes, also of the header
-constexpr int32_t kLook = 4 * kMpegMaxFrame;  // bytes looked at to believe a header
+constexpr int32_t kLook = 4 * kMpegMaxFrame;  // bytes read to confirm a header
 constexpr int32_t kFirstChain = 3;            // headers in a row that start the stream
 constexpr int32_t kResyncChain = 2;           // and that continue it after garbage
 
@@ -42,14 +42,14 @@ int64_t tag_before(io_file *file, int64_t end) {
     return size >= kApeFooter && whole <= end ? whole : 0;
 }
 
-// Where the audio ends: before any ID3v1 and APE tags.
+// Finds where the audio ends: before any ID3v1 and APE tags.
 int64_t find_end(io_file *file) {
     int64_t end = file->size;
     for (int64_t tag = -1; tag != 0; end -= tag) tag = tag_before(file, end);
     return end;
 }
 
-// Whether p (got bytes, to_end bytes of audio) starts a chain of headers of one stream, or one that
+// True if p (got bytes, to_end bytes of audio) starts a chain of headers of one stream, or one that
 // ends exactly with the audio.
 bool starts_chain(const mpeg_scan *s, const uint8_t *p, int32_t got, int64_t to_end,
                   mpeg_header *first) {
@@ -70,14 +70,14 @@ bool starts_chain(const mpeg_scan *s, const uint8_t *p, int32_t got, int64_t to_
     return true;
 }
 
-// The next place at or after s->at where the stream starts or goes on. Skips ID3v2 tags whole.
+// Moves s->at to the next offset where the stream starts or continues. Skips whole ID3v2 tags.
 // False at the end.
 bool find_chain(mpeg_scan *s, mpeg_header *first) {
     while (s->at < s->end) {
         int32_t got = 0;
         const uint8_t *p = io_file_peek(s->file, s->at, kLook, &got);
         if (p == nullptr || got < kMpegHeaderBytes) return false;
-        // Only the last block of the file is looked at to its end.
+        // Only the last block of the file is searched to its end.
         const int32_t sure = s->at + got >= s->end ? got : got - kLook + 1;
         int64_t tag = 0;
         int32_t i = 0;
@@ -93,7 +93,7 @@ bool find_chain(mpeg_scan *s, mpeg_header *first) {
     return false;
 }
 
-// The first frame of music, behind the encoder's table.
+// Finds the first frame of music, after the encoder's table.
 bool find_start(mpeg_scan *s) {
     if (!find_chain(s, &s->head)) return false;
     s->started = true;
@@ -106,8 +106,8 @@ bool find_start(mpeg_scan *s) {
     return find_chain(s, &s->head);
 }
 
-// Frame after frame from s->at to the end; one that the end of the file cuts is not there. False on
-// a read error, when out of memory, and without a frame.
+// Adds the frames from s->at to the end, except one that the end of the file cuts. False on a read
+// error, when out of memory, and when there is no frame.
 bool walk(mpeg_scan *s, frame_index *frames) {
     mpeg_header h = {};
     while (s->end - s->at >= kMpegHeaderBytes) {

@@ -18,7 +18,7 @@ struct codec_name {
     size_t bytes;
 };
 
-// Of the audio codecs, by which their first packets begin; Vorbis first.
+// How the first packets of the audio codecs begin; Vorbis first.
 constexpr codec_name kAudio[] = {
     {"\x01vorbis", 7},
     {"OpusHead", 8},
@@ -33,11 +33,11 @@ struct page_reader {
     ogg_sync_state sync;
     io_file *file;
     int64_t read;  // offset of the next byte to be read
-    int64_t at;    // offset of the next byte to be looked at
+    int64_t at;    // offset of the next byte to be parsed
 };
 
-// The next whole page, its check sum right; *offset receives its place. False at the end and on
-// failure.
+// Reads the next whole page with a correct check sum; *offset receives where it starts. False at
+// the end and on failure.
 bool next_page(page_reader *r, ogg_page *page, int64_t *offset) {
     for (;;) {
         const long step = ogg_sync_pageseek(&r->sync, page);
@@ -56,7 +56,7 @@ bool next_page(page_reader *r, ogg_page *page, int64_t *offset) {
     }
 }
 
-// Notes a stream by its first page; the first audio stream is the one that is read.
+// Adds a stream by its first page; the first audio stream is the one that is read.
 void add_stream(stream_info *info, const ogg_page *page) {
     if (info->track_count >= kOggStreams) return;
     const int32_t i = info->track_count++;
@@ -72,8 +72,8 @@ void add_stream(stream_info *info, const ogg_page *page) {
     }
 }
 
-// Goes through the pages of the first group of streams; a second one may be chained behind. False
-// when the audio stream is not Vorbis after all.
+// Reads the pages of the first group of streams; a second one may be chained to it. False when the
+// audio stream is not Vorbis after all.
 bool read_pages(page_reader *r, ogg_scan *scan) {
     stream_info *info = scan->info;
     ogg_page page;
@@ -87,7 +87,7 @@ bool read_pages(page_reader *r, ogg_scan *scan) {
         const bool was_known = info->track >= 0;
         if (head) add_stream(info, &page);
         if (!was_known) serial = ogg_page_serialno(&page);
-        if (!in_heads && info->codec == nullptr) return true;  // nothing more to be learned
+        if (!in_heads && info->codec == nullptr) return true;  // nothing more to find
         if (info->codec != nullptr && serial == ogg_page_serialno(&page) &&
             !ogg_scan_page(scan, &page, offset + page.header_len)) {
             return false;

@@ -15,7 +15,7 @@ constexpr int32_t kMaxCodebooks = 1 << 20;      // bytes; usual ones have 3 to 1
 constexpr int64_t kMaxGranule = INT64_MAX / 2;  // larger ones count as this: sums stay exact
 constexpr int32_t kMaxPacket32 = 1 << 26;       // bytes; comments may hold pictures
 
-// Stand in for the file's own comments, which no decoder needs and which may hold a picture.
+// Replace the file's own comments, which no decoder needs and which may hold a picture.
 constexpr uint8_t kNoComments[] = {3, 'v', 'o', 'r', 'b', 'i', 's', 0, 0, 0, 0, 0, 0, 0, 0, 1};
 constexpr int32_t kPackHead = 3;  // the mark and the lengths of the first two packets, below 255
 
@@ -30,7 +30,7 @@ bool read_packet(const ogg_scan *scan, int32_t number, uint8_t *packet) {
            is_header(packet, bytes, number);
 }
 
-// Packs the identification and set-up packets into p. False when they are none of Vorbis.
+// Packs the identification and set-up packets into p. False when they are not Vorbis headers.
 bool pack(const ogg_scan *scan, uint8_t *p) {
     p[0] = kVorbisSetupMark;
     p[1] = kIdBytes;
@@ -49,8 +49,8 @@ bool pack(const ogg_scan *scan, uint8_t *p) {
     return scan->info->rate > 0 && scan->info->channels > 0;
 }
 
-// With the three header packets in place.
-bool use_headers(ogg_scan *scan) {
+// Prepares the stream once its three header packets are complete.
+bool read_headers(ogg_scan *scan) {
     const int32_t books = scan->header_bytes[2];
     uint8_t name[kNameBytes];
     if (scan->header_bytes[0] != kIdBytes || books > kMaxCodebooks ||
@@ -66,27 +66,27 @@ bool use_headers(ogg_scan *scan) {
     return scan->parser != nullptr;
 }
 
-// A whole packet has been passed.
+// Adds a packet that is complete.
 bool add_packet(ogg_scan *scan) {
     if (scan->headers < kVorbisHeaders) {
         if (scan->packet_bytes < kNameBytes) return false;
         scan->header_at[scan->headers] = scan->packet_at;
         scan->header_bytes[scan->headers] = scan->packet_bytes;
         ++scan->headers;
-        return scan->headers < kVorbisHeaders || use_headers(scan);
+        return scan->headers < kVorbisHeaders || read_headers(scan);
     }
     if (scan->packet_bytes == 0) return true;
     const int32_t samples = scan->library->parser_samples(scan->parser, scan->packet_first);
-    if (samples <= 0) return true;  // no audio packet: the decoder is not troubled with it
+    if (samples <= 0) return true;  // not an audio packet: not decoded
     // The first packet only primes the decoder for the next.
     frame_index *packets = &scan->info->frames;
     return frame_index_add(packets, scan->packet_at, scan->packet_bytes,
                            packets->count > 0 ? samples : 0);
 }
 
-// The first granule position says where the stream starts. More audio than it counts is cut off at
-// the front, unless the stream also ends here, when it is cut at the end.
-void use_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
+// The first granule position states where the stream starts. More audio than it counts is cut off
+// at the start, unless the stream also ends here, when it is cut at the end.
+void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     frame_index *packets = &scan->info->frames;
     const int64_t surplus = frame_index_end(packets) - granule;
     scan->has_base = true;
@@ -106,8 +106,8 @@ void use_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     }
 }
 
-// Walks the page's lacing values.
-bool take_segments(ogg_scan *scan, const ogg_page *page, int64_t body_first) {
+// Reads the page's lacing values.
+bool read_segments(ogg_scan *scan, const ogg_page *page, int64_t body_first) {
     const int32_t segments = page->header[26];
     const uint8_t *lacing = page->header + 27;
     int64_t at = 0;
@@ -139,7 +139,7 @@ bool ogg_scan_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
     const int64_t body_first = frame_index_end(pages);
     const auto body_bytes = static_cast<int32_t>(page->body_len);
     if (body_bytes > 0 && !frame_index_add(pages, body_at, body_bytes, body_bytes)) return false;
-    // A packet goes on only into the next page, and only where that says so; else it is lost.
+    // A packet continues only in the next page, and only if that page states it; else it is lost.
     const long number = ogg_page_pageno(page);
     const bool missing = number != scan->next_page;
     if (missing || ogg_page_continued(page) == 0) scan->open = false;
@@ -147,12 +147,12 @@ bool ogg_scan_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
     scan->next_page = number + 1;
     const int64_t granule = std::min<int64_t>(ogg_page_granulepos(page), kMaxGranule);
     if (granule >= 0) scan->page_end = frame_index_end(packets);
-    if (!take_segments(scan, page, body_first)) return false;
+    if (!read_segments(scan, page, body_first)) return false;
     if (granule < 0 || packets->count == 0) return true;
     if (!scan->has_base) {
-        use_first_granule(scan, granule, ogg_page_eos(page) != 0);
+        apply_first_granule(scan, granule, ogg_page_eos(page) != 0);
     } else if (scan->gap) {
-        scan->base = granule - frame_index_end(packets);  // time that is lost is not filled
+        scan->base = granule - frame_index_end(packets);  // lost time is not filled
     }
     scan->gap = false;
     scan->last_end = granule - scan->base;
@@ -162,7 +162,7 @@ bool ogg_scan_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
 bool ogg_scan_end(ogg_scan *scan) {
     frame_index *packets = &scan->info->frames;
     if (!scan->has_base) return packets->count > 0;
-    // Never below what ended before the last page: a smaller position is damage.
+    // Never before the end of the page before the last: a smaller position is damage.
     const int64_t end = std::max(scan->last_end, scan->page_end);
     for (int64_t i = packets->count - 1; i >= 0 && frame_index_end(packets) > end; --i) {
         frame_entry &entry = packets->entry[i];

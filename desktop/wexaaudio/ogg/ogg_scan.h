@@ -2,7 +2,7 @@
 //
 // In: pages of the stream, header packets included. Out: the frames of a stream_info.
 //
-// A stream's pages lie scattered and its packets run over their ends, so packets are placed by
+// A stream's pages are scattered and its packets continue across them, so packets are identified by
 // their logical offset: the bytes of the stream's page bodies before them.
 #ifndef WEXAAUDIO_OGG_SCAN_H
 #define WEXAAUDIO_OGG_SCAN_H
@@ -20,7 +20,7 @@ struct ogg_scan {
     int64_t header_at[kVorbisHeaders];
     int32_t header_bytes[kVorbisHeaders];
     int32_t headers;       // found so far
-    long next_page;        // number of the page behind the last
+    long next_page;        // number of the page after the last
     bool gap;              // pages are missing since the last granule position
     bool open;             // a packet has begun
     int64_t packet_at;     // logical offset of it
@@ -28,12 +28,12 @@ struct ogg_scan {
     uint8_t packet_first;  // its first byte
     bool has_base;
     int64_t base;      // granule position at sample 0; known once has_base
-    int64_t page_end;  // end of the audio at the last page with a granule position but one
-    int64_t last_end;  // what the last granule position says the end is, sample frames
+    int64_t page_end;  // end of the audio at the second-last page with a granule position
+    int64_t last_end;  // end by the last granule position, sample frames
 };
 
-// Takes the next page of the stream; body_at is its body's offset in the file. False when out of
-// memory or when the stream is not Vorbis. *scan starts zeroed but for its first three fields.
+// Adds the next page of the stream; body_at is its body's offset in the file. False when out of
+// memory or when the stream is not Vorbis. *scan starts zeroed except for its first three fields.
 bool ogg_scan_page(ogg_scan *scan, ogg_page *page, int64_t body_at);
 
 // Cuts the last packets to the final granule position. False when the stream has no audio.

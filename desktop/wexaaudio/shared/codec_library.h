@@ -1,13 +1,13 @@
-// libavcodec as a table of functions. It brings a hundred shared objects along, so its callers stay
-// in libwexaaudio.so, and what calls it is a private shared object beside that, libwexaaudio_av.so,
-// which is loaded when a file first needs it: AAC, MPEG audio, MP4 and Ogg do.
+// libavcodec as a table of functions. It loads a hundred shared objects, so the code that calls it
+// is a private shared object beside libwexaaudio.so, libwexaaudio_av.so, which is loaded when a
+// file first needs it: AAC, MPEG audio, MP4 and Ogg do.
 #ifndef WEXAAUDIO_CODEC_LIBRARY_H
 #define WEXAAUDIO_CODEC_LIBRARY_H
 
 #include <cstdint>
 
 struct av_decoder;     // one decoder, used by one thread at a time
-struct vorbis_parser;  // tells the length of Vorbis packets
+struct vorbis_parser;  // reads the length of Vorbis packets
 
 constexpr int32_t kCodecNoMemory = -2;
 constexpr int32_t kMaxPacket = 1 << 24;  // bytes, also of set-up data
@@ -17,18 +17,18 @@ struct codec_library {
     av_decoder *(*open)(const char *name, const uint8_t *setup, int32_t setup_bytes);
     void (*close)(av_decoder *decoder);  // null is allowed
 
-    // Room for the next packet of bytes, 1 to kMaxPacket, to be filled before decode. Null when out
-    // of memory.
+    // A buffer for the next packet of bytes, 1 to kMaxPacket, to be filled before decode. Null when
+    // out of memory.
     uint8_t *(*packet)(av_decoder *decoder, int32_t bytes);
 
-    // Decodes the packet. Returns the sample frames now held (0: nothing came), -1 when it cannot
+    // Decodes the packet. Returns the sample frames now held (0: no output), -1 when it cannot
     // be decoded, kCodecNoMemory.
     int32_t (*decode)(av_decoder *decoder);
 
-    // Rate in Hz and channels of what is held; 0 when nothing is.
+    // Rate in Hz and channels of the frames held; 0 without any.
     void (*format)(const av_decoder *decoder, int32_t *rate, int32_t *channels);
 
-    // Writes what is held from sample frame skip on, at most count sample frames, as interleaved
+    // Writes the frames held from sample frame skip on, at most count sample frames, as interleaved
     // 16-bit PCM: rounded to nearest, clipped, without dither. channels 2: front left and right,
     // one channel twice. channels 1: the mean of all, toward zero. Returns the sample frames
     // written.
@@ -38,7 +38,7 @@ struct codec_library {
     // setup: the three header packets in Xiph's packing. Null on failure.
     vorbis_parser *(*parser_open)(const uint8_t *setup, int32_t setup_bytes);
     void (*parser_close)(vorbis_parser *parser);  // null is allowed
-    // Sample frames of the next packet by its first byte; 0 or less when it carries no audio.
+    // Sample frames of the next packet by its first byte; 0 or less when it holds no audio.
     int32_t (*parser_samples)(vorbis_parser *parser, uint8_t first);
 };
 

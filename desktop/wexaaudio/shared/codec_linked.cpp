@@ -1,4 +1,4 @@
-// In the place of codec_loaded.cpp where everything is linked into one program.
+// Replaces codec_loaded.cpp where everything is linked into one program.
 #include "desktop/wexaaudio/shared/codec_library.h"
 
 const codec_library *codec_library_get(void) {

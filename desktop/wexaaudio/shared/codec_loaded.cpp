@@ -1,5 +1,5 @@
-// The table from libwexaaudio_av.so, which lies beside the library that this file is part of. It
-// stays loaded until the process ends.
+// The table from libwexaaudio_av.so, which is in the folder of the library that this file is part
+// of. It stays loaded until the process ends.
 #include <android/log.h>
 #include <dlfcn.h>
 #include <pthread.h>

@@ -6,16 +6,17 @@
 #include "desktop/wexaaudio/shared/units.h"
 
 bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples) {
-    constexpr int64_t kFirstRoom = 1024;     // entries
-    constexpr int64_t kMaxFrames = 1 << 22;  // more than a day of song; a damaged count says more
+    constexpr int64_t kFirstCapacity = 1024;  // entries
+    constexpr int64_t kMaxFrames =
+        1 << 22;  // more than a day of audio; guards against damaged counts
     const int64_t first = frame_index_end(index);
     if (first > kMaxSamples || index->count == kMaxFrames) return false;
-    if (index->count == index->room) {
-        const int64_t room = std::max(kFirstRoom, index->room * 2);
-        void *grown = realloc(index->entry, static_cast<size_t>(room) * sizeof(frame_entry));
+    if (index->count == index->capacity) {
+        const int64_t capacity = std::max(kFirstCapacity, index->capacity * 2);
+        void *grown = realloc(index->entry, static_cast<size_t>(capacity) * sizeof(frame_entry));
         if (grown == nullptr) return false;
         index->entry = static_cast<frame_entry *>(grown);
-        index->room = room;
+        index->capacity = capacity;
     }
     index->entry[index->count++] = {offset, first, bytes, samples};
     return true;

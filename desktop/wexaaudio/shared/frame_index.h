@@ -1,4 +1,4 @@
-// Every frame of a stream with its place in the file and in the stream. Made once at open;
+// Every frame of a stream with its offsets in the file and in the stream. Built once at open;
 // durations and seeks are looked up here, never estimated.
 #ifndef WEXAAUDIO_FRAME_INDEX_H
 #define WEXAAUDIO_FRAME_INDEX_H
@@ -9,17 +9,17 @@ struct frame_entry {
     int64_t offset;   // bytes from the start of the file
     int64_t first;    // the frame's first sample in the decoded stream, sample frames
     int32_t bytes;    // of the whole frame
-    int32_t samples;  // sample frames that it gives
+    int32_t samples;  // sample frames of its output
 };
 
 struct frame_index {
-    frame_entry *entry;  // [room] owned, count used, ascending
+    frame_entry *entry;  // [capacity] owned, count used, ascending
     int64_t count;
-    int64_t room;
+    int64_t capacity;
 };
 
-// Appends a frame that begins where the last one ends. False when out of memory or when no song has
-// so many frames or samples, with the index unchanged.
+// Appends a frame that begins where the last one ends. False, with the index unchanged, when out of
+// memory or when there are more frames or samples than any real file has.
 bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples);
 
 // Number of the frame that holds sample: the last whose first is at or before it; 0 before the

@@ -28,7 +28,7 @@ int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
     return done;
 }
 
-// Makes the block start at offset. What it holds of the place is not read again.
+// Makes the block start at offset. Bytes that it holds already are not read again.
 bool fill_block(io_file *f, int64_t offset) {
     const int64_t held_end = f->block_at + f->block_got;
     int32_t keep = 0;

@@ -31,7 +31,7 @@ void io_file_close(io_file *f);
 // 0 past it, -1 on a read error. Large copies bypass the buffer.
 int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count);
 
-// The buffered bytes at offset: *got receives how many lie there, at least min(want, bytes to the
+// The buffered bytes at offset: *got receives their count, at least min(want, bytes to the
 // end of the file), often more. want <= kMaxLook. Returns null at the end of the file, before its
 // start and on a read error (then failed is set); the pointer is valid until the next call.
 const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *got);

@@ -11,7 +11,7 @@ namespace {
 
 constexpr int32_t kFailed = -3;  // a read error; kCodecNoMemory ends a read as well
 
-// The first frame to decode so that frame n comes out as in a linear read.
+// The first frame to decode so that frame n is bit-identical to a linear read.
 int64_t first_needed(const stream_info *info, int64_t n) {
     if (info->group > 0) n -= n % info->group;
     n = std::max<int64_t>(n - info->preroll, 0);
@@ -22,7 +22,8 @@ int64_t first_needed(const stream_info *info, int64_t n) {
     return n;
 }
 
-// Returns the sample frames held, 0 when the frame does not decode, else why reading ends.
+// Returns the sample frames held, 0 when the frame cannot be decoded, else the reason why reading
+// ends.
 int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     if (entry.bytes <= 0 || entry.bytes > kMaxPacket) return 0;
     uint8_t *packet = r->library->packet(r->decoder, entry.bytes);
@@ -34,7 +35,7 @@ int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     return held == -1 ? 0 : held;
 }
 
-// Decodes frame next, behind what it needs.
+// Decodes frame next, after the frames that it needs.
 int32_t decode_next(stream_reader *r) {
     const stream_info *info = r->info;
     int64_t n = r->next;
@@ -119,8 +120,8 @@ int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached) {
     const frame_index *frames = &r->info->frames;
     const int64_t end = std::max<int64_t>(frame_index_end(frames) - r->info->delay, 0);
     const int64_t sample = seek_target(*position, end, r->info->rate);
-    // At the start the source drops; anywhere else, in the first frame too, the frame's time is not
-    // 0, so that nothing is dropped twice.
+    // The source drops samples at time 0. At any other position, in the first frame too, the
+    // frame's time is not 0, so that nothing is dropped twice.
     const int64_t decoded = sample > 0 ? sample + r->info->delay : 0;
     r->next = sample < end ? frame_index_find(frames, decoded) : frames->count;
     r->skip = sample < end ? static_cast<int32_t>(decoded - frames->entry[r->next].first) : 0;

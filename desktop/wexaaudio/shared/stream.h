@@ -3,8 +3,8 @@
 //
 // In: the frames that a format's scan finds. Out: PCM, frame by frame, for the copying decoders.
 //
-// The output is a function of the place in the file alone: after a seek a fresh decoder first
-// decodes as many frames before the place as it takes to reach the state of a linear read.
+// The output depends on the position in the file alone: after a seek a fresh decoder first decodes
+// as many earlier frames as it needs to reach the state of a linear read.
 #ifndef WEXAAUDIO_STREAM_H
 #define WEXAAUDIO_STREAM_H
 
@@ -15,13 +15,13 @@
 
 constexpr int32_t kMaxTracks = 64;
 
-// What a scan learns of a file. Not changed afterwards: readers of the same file share it.
+// What a scan finds in a file. Not changed afterwards: readers of the same file share it.
 struct stream_info {
     frame_index frames;  // owned
-    frame_index pages;   // owned; Ogg: offset is a page body's place in the file, first its logical
-                         // offset, samples its bytes. Frames then have logical offsets
-    const char *codec;   // libavcodec's name; null when there is no stream that can be decoded
-    uint8_t *setup;      // owned; set-up data of the decoder, may be null
+    frame_index pages;  // owned; Ogg: offset is a page body's offset in the file, first its logical
+                        // offset, samples its bytes. Frames then have logical offsets
+    const char *codec;  // libavcodec's name; null when there is no stream that can be decoded
+    uint8_t *setup;     // owned; set-up data of the decoder, may be null
     int32_t setup_bytes;
     int32_t rate;          // Hz, of the output
     int32_t channels;      // of the stream
@@ -35,12 +35,12 @@ struct stream_info {
     int32_t group;
     int32_t preroll;
     int32_t reservoir;  // bytes
-    int32_t overhead;   // bytes of a frame that are no payload
+    int32_t overhead;   // bytes of a frame before its payload
 
     int64_t cut_frame;    // the frame whose output loses cut_samples at its front
     int32_t cut_samples;  // 0: none does
 
-    // Of a container.
+    // In a container.
     int32_t track_count;
     int32_t kind[kMaxTracks];  // kWexaKindAudio for audio
     int32_t track;             // the one that is read; -1 without one
@@ -68,8 +68,8 @@ void stream_close(void *reader);  // null is allowed
 // 100-ns units.
 int64_t stream_duration(const stream_reader *reader);
 
-// The next frame that gives samples: a frame that does not decode gives silence. Returns 0, 1 at
-// the end, -1 on failure. first and second: start and length, 100-ns units.
+// Reads the next frame that has samples: a frame that cannot be decoded becomes silence. Returns 0,
+// 1 at the end, -1 on failure. first and second: start and length, 100-ns units.
 int32_t stream_read(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                     int64_t *second);
 
@@ -82,7 +82,7 @@ int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached);
 int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
                     int64_t bytes);
 
-// Hands set-up data over as a copy. False when out of memory.
+// Stores a copy of set-up data. False when out of memory.
 bool stream_set_up(stream_info *info, const uint8_t *setup, int32_t bytes);
 
 // Releases what a scan's result owns.

@@ -1,4 +1,4 @@
-// RIFF WAVE with 16-bit linear PCM: chunks in any order, lying sizes, files beyond 4 GiB.
+// RIFF WAVE with 16-bit linear PCM: chunks in any order, wrong sizes, files beyond 4 GiB.
 //
 // In: mtsrc_io. Out: whole sample frames of interleaved PCM, the information record.
 #include <algorithm>
@@ -17,10 +17,10 @@ constexpr int32_t kChunkHead = 8;         // bytes: name, size
 constexpr int32_t kFormatBytes = 16;      // least size of a "fmt " chunk
 constexpr int32_t kExtensibleBytes = 40;  // of an extensible one
 constexpr uint32_t kUnknownSize = 0xFFFFFFFF;
-constexpr int32_t kMaxChunks = 65536;  // a file that has more is no song
+constexpr int32_t kMaxChunks = 65536;  // real files have far fewer
 constexpr int32_t kTagPcm = 1;
 constexpr int32_t kTagExtensible = 0xFFFE;
-constexpr int32_t kTagCollision = 0x10000;  // keeps a file's own tag 300 apart from kWexaPcm
+constexpr int32_t kTagCollision = 0x10000;  // distinguishes a file's own tag 300 from kWexaPcm
 constexpr int32_t kSampleBytes = 2;
 
 // What follows the format tag in the sub-format of an extensible header.
@@ -66,8 +66,8 @@ void read_format(wav_head *head, const uint8_t *p, int64_t bytes) {
     }
 }
 
-// A data size of nothing or of all ones was never filled in by its writer, and a file may be cut
-// short: the rest of the file is the data then.
+// A data size of 0 or of all ones was never filled in by its writer, and a file may be cut short:
+// then the rest of the file is the data.
 void read_data(wav_head *head, int64_t offset, uint32_t size, int64_t file_size) {
     const int64_t rest = file_size - offset;
     head->has_data = true;
@@ -103,8 +103,8 @@ bool read_chunks(io_file *f, wav_head *head) {
     return true;
 }
 
-// Fills the record for the reasons of a refusal too. False when the header is too broken to say
-// anything: the record stays empty.
+// Fills in the record, which also explains a refusal. False when the header is too damaged: the
+// record stays empty.
 bool fill_info(xwav_info *info, const wav_head *head) {
     const bool has_rate = head->rate > 0 && head->rate <= INT32_MAX;
     if (!head->has_format || head->channels == 0 || !has_rate) return false;
