@@ -1,5 +1,4 @@
-// The command: options, the files they name, their results. See options.h, inputs.h,
-// analyse_inputs.h.
+// The command: reads the options and analyses the files that they name.
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -12,16 +11,16 @@
 
 namespace {
 
-// Opens /dev/null for each standard stream that is closed, so that no pipe gets its number.
-// Writing to such a stream still fails.
-void hold_standard_streams() {
+// Opens /dev/null for reading on each standard stream that is closed, so that no pipe gets its
+// number. Writing to such a stream still fails.
+void open_standard_streams() {
     for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {
         if (fcntl(fd, F_GETFD) < 0) open("/dev/null", O_RDONLY);
     }
 }
 
 int run(int argc, char **argv) {
-    hold_standard_streams();
+    open_standard_streams();
     options opts;
     if (const std::optional<int> status = parse_options(argc, argv, opts)) return *status;
     if (!watch_for_stop()) {
@@ -36,8 +35,8 @@ int run(int argc, char **argv) {
 int main(int argc, char **argv) {
     try {
         return run(argc, argv);
-    } catch (const std::exception &wrong) {  // memory for names and texts
-        fprintf(stderr, "tavo: %s\n", wrong.what());
+    } catch (const std::exception &error) {  // out of memory
+        fprintf(stderr, "tavo: %s\n", error.what());
         return kExitFailed;
     }
 }

@@ -17,8 +17,8 @@
 
 namespace {
 
-// Written by the callback on the job's thread, which gets no argument of ours: the pointer hands
-// over the result, the pipe wakes the waiting thread.
+// Set by the callback on the thread of the job: the pointer hands over the result, the pipe wakes
+// the waiting thread.
 std::atomic<const TAVO_INFO *> result{nullptr};
 int done_write_fd = -1;
 
@@ -29,7 +29,7 @@ void on_result(TAVO_INFO *info) {
     }
 }
 
-// Waits for the callback or the stop. Returns false for the stop.
+// Waits for the callback or the stop. Returns true after the callback.
 bool wait_for_result(int done_fd, int stop_fd) {
     pollfd watched[2] = {{done_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
     while (true) {
@@ -44,7 +44,7 @@ void read_stream(const TAVO_CTX *ctx, record &out) {
     out.has_stream = true;
 }
 
-// After the callback the job writes nothing any more.
+// Call it after the callback, when the job no longer changes the instance.
 void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
     if (tavo_has_audio(ctx) == 0) {
         out.error = "No audio could be decoded from the file.";
@@ -123,7 +123,7 @@ void analyse_opened(const options &opts, int stop_fd, song_file &song, record &o
     if (is_stop_requested(stop_fd)) out.status = outcome::stopped;
 }
 
-// Of this process, all threads, and of the ffmpeg processes that it ran: user and system.
+// Processor time of this process, all threads, and of its ffmpeg processes, user and system.
 int64_t cpu_time_ms() {
     int64_t sum = 0;
     for (const auto who : {RUSAGE_SELF, RUSAGE_CHILDREN}) {

@@ -1,4 +1,4 @@
-// One file becomes one record: the library's instance from creation to release.
+// Analyses one file: creates an instance of the library, runs its job and releases it.
 //
 // In: a path and options. Out: a record. Runs in a worker process (worker_process.h), which holds
 // at most one instance at a time. After: format.h.
@@ -11,9 +11,9 @@
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// stop_fd: becoming readable or closed at its other end stops the analysis through tavo_deinit.
-// Returns when the file's job has ended. song receives the sound that was analysed, if path could
-// be opened; the caller closes it.
+// Blocks until the job has ended. It is stopped when stop_fd becomes readable or is closed at its
+// other end. song receives the sound that was analysed, if path could be opened; the caller closes
+// it.
 record analyse(const std::string &path, const options &opts, int stop_fd, song_file &song);
 
 #endif

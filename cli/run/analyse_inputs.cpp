@@ -17,8 +17,8 @@
 namespace {
 
 constexpr size_t kMostAhead = 10'000;   // inputs found before they can be analysed
-constexpr size_t kFoundAtOnce = 64;     // between two looks at the workers
-constexpr size_t kMostWaiting = 1'000;  // results held until an earlier one is there
+constexpr size_t kFoundAtOnce = 64;     // before the workers are served again
+constexpr size_t kMostWaiting = 1'000;  // results that wait for an earlier one
 
 struct run_state {
     const options &opts;
@@ -30,10 +30,10 @@ struct run_state {
     store db = {};
     process_pool pool;
     bool is_ending = false;  // no more jobs are sent
-    bool has_error = false;  // other than a failed file
+    bool has_error = false;  // one that concerns no single file
 };
 
-// Writes the line for a failure that concerns no single file. True if there was one.
+// Writes a message if there was a failure that concerns no single file. Returns true if so.
 bool report(run_state &state, const failure &failed) {
     if (!failed) return false;
     state.has_error = true;
@@ -42,15 +42,16 @@ bool report(run_state &state, const failure &failed) {
 }
 
 void accept_result(run_state &state, job &&done, reply &&answer) {
-    const size_t index = done.asked.index;
-    if (done.asked.stored.empty()) {
-        report(state, add_song(state.db, {done.asked.path, done.file, std::move(answer.json), {}}));
+    const size_t index = done.message.index;
+    if (done.message.stored.empty()) {
+        report(state,
+               add_song(state.db, {done.message.path, done.file, std::move(answer.json), {}}));
     }
     accept_reply(state.output, index, std::move(answer));
 }
 
 void fail_input(run_state &state, job &&failed, const std::string &error) {
-    const record result = failed_record(failed.asked.path, state.opts.mode, error);
+    const record result = failed_record(failed.message.path, state.opts.mode, error);
     accept_result(state, std::move(failed), make_reply(result, state.opts));
 }
 
@@ -59,34 +60,34 @@ bool may_search(const run_state &state) {
            state.queue.size() < kMostAhead;
 }
 
-// The next input of the command line, or of the store.
+// Finds the next input of the command line or of the store.
 supply_state find_next(run_state &state, job &next) {
     if (state.opts.from_store) {
         stored_song song;
         bool found = false;
         report(state, read_next(state.db, song, found));
-        next.asked.path = song.path;
-        next.asked.stored = song.result;
+        next.message.path = song.path;
+        next.message.stored = song.result;
         next.refusal = song.damage;
         return found ? supply_state::ready : supply_state::ended;
     }
     input entry;
     const supply_state found = next_input(state.supply, entry);
-    next.asked.path = std::move(entry.path);
+    next.message.path = std::move(entry.path);
     next.refusal = std::move(entry.refusal);
     return found;
 }
 
 // True if the input belongs to this command's share and is not stored yet.
 bool is_wanted(run_state &state, job &next) {
-    if (!in_shard(state.opts.share, next.asked.path)) return false;
+    if (!in_shard(state.opts.share, next.message.path)) return false;
     if (state.opts.from_store || next.refusal) return true;
     bool is_new = true;
-    report(state, find_song(state.db, next.asked.path, next.file, is_new));
+    report(state, find_song(state.db, next.message.path, next.file, is_new));
     return is_new;
 }
 
-// Finds a few more inputs, unless enough are waiting.
+// Finds a few more inputs, unless enough are queued.
 void search_inputs(run_state &state) {
     for (size_t i = 0; i < kFoundAtOnce && may_search(state); ++i) {
         job next;
@@ -94,18 +95,18 @@ void search_inputs(run_state &state) {
         if (state.found == supply_state::ended) set_total(state.output, state.count);
         if (state.found != supply_state::ready) break;
         if (!is_wanted(state, next)) continue;
-        next.asked.index = state.count++;
+        next.message.index = state.count++;
         state.queue.push_back(std::move(next));
     }
     if (!state.opts.quiet) write_message(state.output, state.supply.notes);
     state.supply.notes.clear();
 }
 
-// Gives every idle worker a job.
+// Sends a job to every idle worker.
 void send_jobs(run_state &state) {
     while (!state.is_ending && !state.queue.empty()) {
         job &first = state.queue.front();
-        if (first.asked.index >= state.output.next + kMostWaiting) return;
+        if (first.message.index >= state.output.next + kMostWaiting) return;
         failure failed = first.refusal;
         worker_process *worker = failed ? nullptr : find_idle(state.pool, failed);
         if (worker == nullptr && !failed) return;
@@ -128,8 +129,8 @@ int shortest_wait(std::initializer_list<int> waits) {
     return shortest;
 }
 
-// Waits for what comes next: replies, names in a list, a stop, the end of the results' reader.
-// Returns at once while there are inputs to be found.
+// Waits for replies, names in a list, a stop, or the end of the process that reads the results.
+// Does not wait while inputs are being searched for.
 void wait_and_serve(run_state &state) {
     const bool is_listening = may_search(state) && state.found == supply_state::waiting;
     const bool is_searching = may_search(state) && !is_listening;

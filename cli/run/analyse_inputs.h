@@ -1,5 +1,5 @@
-// From the inputs to the results: hands inputs to the worker processes, their replies to the store
-// and to the output, in the order of the inputs.
+// Sends inputs to the worker processes, and their replies to the store and, in the order of the
+// inputs, to the output.
 #ifndef TAVO_CLI_RUN_ANALYSE_INPUTS_H
 #define TAVO_CLI_RUN_ANALYSE_INPUTS_H
 

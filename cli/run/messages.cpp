@@ -8,7 +8,7 @@
 
 namespace {
 
-// A message is a number, and texts with their sizes before them.
+// A message is a head and the texts, one after the other.
 
 template <size_t kTexts>
 struct message_head {

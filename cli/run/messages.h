@@ -1,5 +1,5 @@
-// What the command and a worker process send each other: a request through one pipe, its reply
-// through another. A worker has at most one request.
+// The messages between the command and a worker process: a request through one pipe, its reply
+// through another. A worker has at most one request at a time.
 #ifndef TAVO_CLI_RUN_MESSAGES_H
 #define TAVO_CLI_RUN_MESSAGES_H
 
@@ -29,10 +29,10 @@ std::string encode(const reply &message);
 bool decode(std::string &received, request &message);
 bool decode(std::string &received, reply &message);
 
-// Sent when there is not enough memory to encode a reply: decodes to a failed one without texts.
+// The reply sent when there is not enough memory for another: failed, without texts.
 extern const std::string kEmptyReply;
 
-// Writes all of it, going on after interruptions. Returns 0 or errno.
+// Writes all bytes and repeats interrupted calls. Returns 0 or errno.
 int write_all(int fd, const char *data, size_t size);
 
 #endif

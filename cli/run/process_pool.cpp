@@ -27,7 +27,7 @@ void close_fd(int &fd) {
     fd = -1;
 }
 
-// In the new process. Other workers' pipes must not stay open here: their ends are signals.
+// Runs in the new process. It closes the pipes of the other workers: their ends are signals.
 [[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_files *files,
                                 int request_fd, int reply_fd) {
     for (worker_process &other : pool.processes) {
@@ -36,7 +36,7 @@ void close_fd(int &fd) {
     }
     ignore_stop_signals();
     prctl(PR_SET_PDEATHSIG, remove_files_at_signal(files));
-    if (getppid() != command) _exit(kExitFailed);  // it ended before that
+    if (getppid() != command) _exit(kExitFailed);  // the command has already ended
     exit(serve_requests(request_fd, reply_fd, pool.opts));
 }
 
@@ -77,9 +77,9 @@ std::string ending_text(int status) {
     return "with status " + std::to_string(WEXITSTATUS(status));
 }
 
-// The reply of a worker that ended without one.
+// The reply for the job of a worker that ended without replying.
 reply make_last_reply(const process_pool &pool, const worker_process &worker, int status) {
-    record result = failed_record(worker.current.asked.path, pool.opts.mode, "");
+    record result = failed_record(worker.current.message.path, pool.opts.mode, "");
     if (pool.is_stopping) {
         result.status = outcome::stopped;
     } else if (worker.has_deadline && steady_clock::now() >= worker.deadline) {
@@ -95,7 +95,7 @@ void finish_job(process_pool &pool, worker_process &worker, reply &&answer) {
     worker.is_busy = false;
     worker.has_deadline = false;
     if (answer.status == outcome::failed && answer.message.empty()) {  // kEmptyReply
-        answer = make_reply(failed_record(worker.current.asked.path, pool.opts.mode,
+        answer = make_reply(failed_record(worker.current.message.path, pool.opts.mode,
                                           "There is not enough memory for the result."),
                             pool.opts);
         answer.json.clear();
@@ -155,8 +155,8 @@ void send_job(const process_pool &pool, worker_process &worker, job &&next) {
     worker.current = std::move(next);
     worker.is_busy = true;
     if (pool.opts.timeout_s > 0) set_deadline(worker, std::chrono::seconds(pool.opts.timeout_s));
-    // The end of a worker that died meanwhile shows at its reply pipe.
-    const std::string message = encode(worker.current.asked);
+    // If the worker has died, its reply pipe ends: no need to check here.
+    const std::string message = encode(worker.current.message);
     write_all(worker.request_fd, message.data(), message.size());
 }
 

@@ -1,8 +1,8 @@
-// The worker processes, seen from the command. The library allows one instance per process: workers
-// run several analyses at once and confine a crash to its own file.
+// Starts, feeds, stops and reaps the worker processes. The library allows one instance per process:
+// with workers several files are analysed at once, and a crash costs one file.
 //
-// The end of a request pipe stops a running analysis and its worker; the end of a reply pipe is
-// that of its worker. Single-threaded, so that a fork is safe at any moment.
+// Closing a request pipe stops the analysis and the worker; the reply pipe ends with the worker.
+// The command is single-threaded, so that it can fork at any moment.
 #ifndef TAVO_CLI_RUN_PROCESS_POOL_H
 #define TAVO_CLI_RUN_PROCESS_POOL_H
 
@@ -20,20 +20,20 @@
 #include "cli/run/temporary_files.h"
 #include "cli/store/store.h"
 
-// An input on its way through the command.
+// An input, from its discovery to its result.
 struct job {
-    request asked;
-    failure refusal;  // if the input is known to be unusable already
+    request message;
+    failure refusal;  // if the input is already known to be unusable
     file_state file;  // for the store
 };
 
 struct worker_process {
     pid_t pid = -1;
-    int request_fd = -1;  // -1 once the worker is to end
+    int request_fd = -1;  // -1 once the worker was asked to end
     int reply_fd = -1;    // -1 once it has ended
     bool is_busy = false;
     job current;           // while busy
-    std::string received;  // a reply under way
+    std::string received;  // start of a reply
     bool has_deadline = false;
     std::chrono::steady_clock::time_point deadline;  // the worker is killed then
     temporary_files *files = nullptr;                // shared with the worker
@@ -49,24 +49,24 @@ struct process_pool {
     bool is_stopping = false;
 };
 
-// An idle worker, started if there are fewer than --jobs. Null if all are busy, or with a failure
-// if there is none. In a new worker process this does not return.
+// Returns an idle worker; starts one if there are fewer than --jobs. Returns null if all are busy,
+// or, with a failure, if none could be started. Does not return in a new worker process.
 worker_process *find_idle(process_pool &pool, failure &failed);
 
 void send_job(const process_pool &pool, worker_process &worker, job &&next);
 
 bool has_busy(const process_pool &pool);
 
-// Lets the workers end. With is_stop their jobs are given up, and workers that have not ended after
-// a second are killed.
+// Asks the workers to end. With is_stop they give up their jobs and are killed if they have not
+// ended after a second.
 void end_workers(process_pool &pool, bool is_stop);
 
 // For poll: appends one entry for each worker, in their order.
 void append_watched(const process_pool &pool, std::vector<pollfd> &watched);
 int deadline_timeout_ms(const process_pool &pool);  // -1 without a deadline
 
-// Reads what workers have sent, given poll's answer, kills those past their deadline and reaps
-// those that have ended.
+// Reads the replies, kills workers past their deadline and reaps those that have ended. watched:
+// the entries of append_watched, after poll.
 void serve_workers(process_pool &pool, const pollfd *watched);
 
 #endif

@@ -12,7 +12,7 @@
 
 namespace {
 
-constexpr double kFirstDrawSeconds = 1.0;  // shorter work needs no bar
+constexpr double kFirstDrawSeconds = 1.0;  // no bar for shorter work
 constexpr size_t kMostBarColumns = 40;
 constexpr size_t kUsualColumns = 80;
 

@@ -1,5 +1,4 @@
-// One line on the terminal with the state of the work: a bar, files done, files a minute and the
-// time left.
+// The progress line on the terminal: a bar, files done, files per minute and the time left.
 #ifndef TAVO_CLI_RUN_PROGRESS_H
 #define TAVO_CLI_RUN_PROGRESS_H
 
@@ -7,8 +6,8 @@
 #include <cstddef>
 
 struct progress {
-    bool shown = false;  // whether there may be a line: on a terminal, not quiet
-    bool drawn = false;  // the line is on the terminal now
+    bool shown = false;  // standard error is a terminal, and not --quiet
+    bool drawn = false;  // the line is on the terminal
     size_t total = 0;    // files; 0 while not all are known
     std::chrono::steady_clock::time_point started;
 };
@@ -17,10 +16,10 @@ constexpr int kRedrawMs = 500;
 
 progress start_progress(bool quiet);
 
-// Redraws the line, once the work has taken a second. Draws nothing for a single file.
+// Redraws the line once the work has taken a second, but not for a single file.
 void draw_progress(progress &bar, size_t done);
 
-// Clears the line; call this before writing anything else to the terminal.
+// Clears the line. Call it before writing anything else to the terminal.
 void clear_progress(progress &bar);
 
 #endif

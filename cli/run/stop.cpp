@@ -29,7 +29,7 @@ void set_handler(int number, void (*handler)(int)) {
     struct sigaction action {};
     action.sa_handler = handler;
     sigemptyset(&action.sa_mask);
-    sigaction(number, &action, nullptr);  // no SA_RESTART: a read of a list is left
+    sigaction(number, &action, nullptr);  // no SA_RESTART: a blocked read must return
 }
 
 bool is_ignored(int number) {
@@ -45,7 +45,7 @@ bool watch_for_stop() {
     set_handler(SIGTERM, on_signal);
     if (!is_ignored(SIGHUP)) set_handler(SIGHUP, on_signal);  // nohup
     set_handler(SIGPIPE, SIG_IGN);
-    set_handler(SIGXFSZ, SIG_IGN);  // a file grown too large is an error of its write
+    set_handler(SIGXFSZ, SIG_IGN);  // writing beyond the size limit returns an error
     return true;
 }
 

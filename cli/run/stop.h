@@ -1,17 +1,17 @@
-// The user's wish to stop: Ctrl-C, a termination request or a closed terminal. The first one is
-// noted and wakes the command, the second one ends it at once.
+// The user's stop: Ctrl-C, a termination request or a closed terminal. The first signal asks the
+// command to stop, the second one ends it immediately.
 #ifndef TAVO_CLI_RUN_STOP_H
 #define TAVO_CLI_RUN_STOP_H
 
-// Installs the handlers and makes failed writes an error instead of a signal.
-// Returns false when the system refuses.
+// Installs the handlers, and ignores the signals of failed writes, which return errors then.
+// Returns false with errno if the system refuses.
 bool watch_for_stop();
 
-// In a worker process, which ends with its request pipe: ignores these signals there.
+// Ignores these signals in a worker process, which ends with its request pipe.
 void ignore_stop_signals();
 
 bool stop_requested();
 int stop_signal();  // its number, 0 without a request
-int stop_fd();      // readable once a stop was requested
+int stop_fd();      // becomes readable at the first signal
 
 #endif

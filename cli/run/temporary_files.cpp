@@ -53,7 +53,7 @@ void note_temporary_file(const std::string &path) {
     if (own_files == nullptr || path.size() >= PATH_MAX) return;
     for (auto &slot : own_files->paths) {
         if (slot[0] != '\0') continue;
-        // The first character last: a path that is half written is a free one.
+        // The first character comes last: until then the slot counts as free.
         memcpy(slot + 1, path.c_str() + 1, path.size());
         slot[0] = path[0];
         return;

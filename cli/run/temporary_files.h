@@ -1,5 +1,5 @@
-// The temporary files that a worker process is writing, in memory that it shares with the command:
-// whoever outlives the other removes them.
+// The names of the temporary files that a worker process is writing, in memory shared with the
+// command: either removes them after the death of the other.
 #ifndef TAVO_CLI_RUN_TEMPORARY_FILES_H
 #define TAVO_CLI_RUN_TEMPORARY_FILES_H
 
@@ -7,19 +7,19 @@
 
 struct temporary_files;
 
-// Null without memory.
+// Returns null if there is no memory.
 temporary_files *make_temporary_files();
 void release_temporary_files(temporary_files *files);  // accepts null
 
-// In a worker: makes a signal remove its files and end it, and makes note_temporary_file and
-// forget_temporary_file act on them. Returns the signal's number.
+// Call it in a worker. From then on a signal, whose number it returns, removes the files and ends
+// the worker, and the two functions below enter files here.
 int remove_files_at_signal(temporary_files *files);
 
-// Of this process; they do nothing in the command itself.
+// Enter and delete a file of this worker. In the command itself they do nothing.
 void note_temporary_file(const std::string &path);
 void forget_temporary_file(const std::string &path);
 
-// Removes the files that are noted and not forgotten. Safe in a signal handler.
+// Removes the files that are entered. Safe in a signal handler.
 void remove_files(temporary_files *files);
 
 #endif

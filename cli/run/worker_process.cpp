@@ -23,21 +23,21 @@ namespace {
 constexpr int kLargestHeapBlock = 32 << 20;  // bytes; the most that malloc takes
 constexpr int kFreeMemoryKept = 64 << 20;    // bytes
 
-// The result that the store had, or that of an analysis.
-record find_result(const request &asked, const options &opts, int stop_fd, song_file &song) {
-    if (asked.stored.empty()) return analyse(asked.path, opts, stop_fd, song);
+// Returns the stored result, or analyses the file.
+record find_result(const request &message, const options &opts, int stop_fd, song_file &song) {
+    if (message.stored.empty()) return analyse(message.path, opts, stop_fd, song);
     record out;
     try {
-        out = record_from_json(asked.stored);
+        out = record_from_json(message.stored);
     } catch (const nlohmann::json::exception &) {
         out.mode = opts.mode;
         out.error = "Its row in the store is damaged.";
     }
-    out.file = asked.path;
+    out.file = message.path;
     out.length_s = opts.length_s;
     const bool is_decoded = !out.decoder.empty() && !opts.report.empty() &&
-                            !open_song(asked.path, stop_fd, song) &&
-                            !decode_song(asked.path, opts, stop_fd, song);
+                            !open_song(message.path, stop_fd, song) &&
+                            !decode_song(message.path, opts, stop_fd, song);
     if (is_decoded) out.sound_path = song.path;
     return out;
 }
@@ -47,8 +47,8 @@ bool is_stored(const options &opts) {
     return !opts.store.empty() && !opts.from_store;
 }
 
-// A file that is written beside the result. A target that cannot be written is found out before the
-// analysis. write enters what goes wrong into the record.
+// A file that is written besides the result. refusal: the target cannot be written, which is
+// checked before the analysis. write turns the record into a failed one if it fails.
 struct companion {
     bool wanted;
     std::string refusal;
@@ -64,7 +64,7 @@ bool has_content(const std::string &path, const std::string &content) {
 
 void write_markers(record &result, const options &opts, const std::string &target) {
     const std::string content = marker_content(result, opts);
-    // A run that was killed after it wrote the file and before its row was committed left it.
+    // The file of a run that was killed before it committed the row.
     if (is_stored(opts) && has_content(target, content)) {
         result.written = target;
         return;
@@ -77,64 +77,64 @@ void write_markers(record &result, const options &opts, const std::string &targe
     }
 }
 
-companion markers_of(const request &asked, const options &opts) {
+companion markers_of(const request &message, const options &opts) {
     if (!writes_files(opts.format)) return {};
-    const std::string target = marker_path(asked.path, opts);
+    const std::string target = marker_path(message.path, opts);
     // With a store an existing file may be this song's: write_markers compares.
     return {true, check_target(target, opts.force || is_stored(opts)),
             [=](record &result) { write_markers(result, opts, target); }};
 }
 
-companion page_of(const request &asked, const options &opts, int stop_fd, std::string &row) {
+companion page_of(const request &message, const options &opts, int stop_fd, std::string &row) {
     if (opts.report.empty()) return {};
-    const std::string target = report_page_path(opts, asked.index, asked.path);
+    const std::string target = report_page_path(opts, message.index, message.path);
     return {true, check_report(target, opts.force),
             [=, &row](record &result) { write_report_page(result, opts, target, stop_fd, row); }};
 }
 
-companion clip_of(const request &asked, const options &opts, int stop_fd, const song_file &song) {
+companion clip_of(const request &message, const options &opts, int stop_fd, const song_file &song) {
     if (opts.clip.empty()) return {};
-    const std::string target = clip_path(asked.path, opts);
+    const std::string target = clip_path(message.path, opts);
     return {true, check_target(target, opts.force),
             [=, &opts, &song](record &result) { write_clip(result, opts, target, stop_fd, song); }};
 }
 
-// is_kept becomes false if the song could be analysed and only a file beside it failed: the store
-// does not take that for a song that fails.
-record analyse_and_write(const request &asked, const options &opts, int stop_fd, std::string &row,
-                         bool &is_kept) {
+// is_storable becomes false if only writing such a file failed: the store does not record that as a
+// failure of the song.
+record analyse_and_write(const request &message, const options &opts, int stop_fd, std::string &row,
+                         bool &is_storable) {
     song_file song;
-    const companion companions[] = {page_of(asked, opts, stop_fd, row), markers_of(asked, opts),
-                                    clip_of(asked, opts, stop_fd, song)};
+    const companion companions[] = {page_of(message, opts, stop_fd, row), markers_of(message, opts),
+                                    clip_of(message, opts, stop_fd, song)};
     for (const companion &each : companions) {
-        is_kept = each.refusal.empty();
-        if (!is_kept) return failed_record(asked.path, opts.mode, each.refusal);
+        is_storable = each.refusal.empty();
+        if (!is_storable) return failed_record(message.path, opts.mode, each.refusal);
     }
-    record out = find_result(asked, opts, stop_fd, song);
+    record out = find_result(message, opts, stop_fd, song);
     const bool is_ok = out.status == outcome::ok;
     for (const companion &each : companions) {
         if (each.wanted && out.status == outcome::ok) each.write(out);
     }
     close_song(song);
-    is_kept = !is_ok || out.status == outcome::ok;
+    is_storable = !is_ok || out.status == outcome::ok;
     return out;
 }
 
-reply answer(const request &asked, const options &opts, int stop_fd) {
+reply make_answer(const request &message, const options &opts, int stop_fd) {
     std::string row;
-    bool is_kept = true;
-    const record result = analyse_and_write(asked, opts, stop_fd, row, is_kept);
+    bool is_storable = true;
+    const record result = analyse_and_write(message, opts, stop_fd, row, is_storable);
     reply out = make_reply(result, opts);
-    if (!is_kept) out.json.clear();
+    if (!is_storable) out.json.clear();
     if (result.status == outcome::ok) out.row = row;
     return out;
 }
 
-// The reply, ready to be sent.
-std::string encoded_answer(const request &asked, const options &opts, int stop_fd) {
+// Returns the reply as it is sent.
+std::string encoded_answer(const request &message, const options &opts, int stop_fd) {
     try {
-        return encode(answer(asked, opts, stop_fd));
-    } catch (const std::exception &) {  // memory is all that can fail here
+        return encode(make_answer(message, opts, stop_fd));
+    } catch (const std::exception &) {  // only allocations can fail here
         return kEmptyReply;
     }
 }
@@ -158,7 +158,7 @@ reply make_reply(const record &result, const options &opts) {
 }
 
 int serve_requests(int request_fd, int reply_fd, const options &opts) {
-    // Large buffers of one job are the next one's, instead of new pages from the system each time.
+    // The next job reuses the memory of this one instead of asking the system for new pages.
     mallopt(M_MMAP_THRESHOLD, kLargestHeapBlock);
     mallopt(M_TRIM_THRESHOLD, kFreeMemoryKept);
     std::string received;
@@ -168,9 +168,9 @@ int serve_requests(int request_fd, int reply_fd, const options &opts) {
         if (got < 0 && errno == EINTR) continue;
         if (got <= 0) return kExitOk;
         received.append(part, static_cast<size_t>(got));
-        request asked;
-        if (!decode(received, asked)) continue;
-        const std::string message = encoded_answer(asked, opts, request_fd);
-        if (write_all(reply_fd, message.data(), message.size()) != 0) return kExitOk;
+        request message;
+        if (!decode(received, message)) continue;
+        const std::string answer_text = encoded_answer(message, opts, request_fd);
+        if (write_all(reply_fd, answer_text.data(), answer_text.size()) != 0) return kExitOk;
     }
 }

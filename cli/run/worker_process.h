@@ -1,5 +1,4 @@
-// A worker process: takes requests, analyses their files, writes what goes beside the results, and
-// replies.
+// A worker process: receives requests, analyses their files, writes markers and pages, and replies.
 #ifndef TAVO_CLI_RUN_WORKER_PROCESS_H
 #define TAVO_CLI_RUN_WORKER_PROCESS_H
 

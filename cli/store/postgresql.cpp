@@ -12,7 +12,7 @@ constexpr Oid kBytesOid = 17;  // of the server's types, fixed for all versions
 constexpr Oid kBigintOid = 20;
 constexpr Oid kIntegerOid = 23;
 
-// The server's words in one line.
+// The server's text in one line.
 std::string sentence(const char *words) {
     std::string text = words;
     while (!text.empty() && text.back() == '\n') text.pop_back();
@@ -20,13 +20,13 @@ std::string sentence(const char *words) {
     return text;
 }
 
-// Only the classes of errors that pass: of the connection, of transactions that ran beside each
-// other, of resources, of locks, of a server that is being stopped. Without a code it is gone.
+// Errors of the connection, of concurrent transactions, resources and locks, and of a server that
+// shuts down are temporary. Without a code the connection was lost.
 bool is_permanent(const char *sql_state) {
     if (sql_state == nullptr) return false;
     const std::string_view code_class(sql_state, 2);
-    for (const char *passing : {"08", "40", "53", "55", "57", "58"}) {
-        if (code_class == passing) return false;
+    for (const char *temporary : {"08", "40", "53", "55", "57", "58"}) {
+        if (code_class == temporary) return false;
     }
     return true;
 }
@@ -44,7 +44,7 @@ failure connect(const std::string &location, bool /*read_only*/, void **handle) 
     return {};
 }
 
-// Values as the protocol takes them: numbers and text as text, bytes as they are.
+// Values in the form of the protocol: numbers and text as text, bytes unchanged.
 struct parameters {
     std::vector<std::string> texts;
     std::vector<const char *> values;
@@ -55,7 +55,7 @@ struct parameters {
 
 parameters make_parameters(const row &values) {
     parameters out;
-    out.texts.reserve(values.size());  // their addresses are kept
+    out.texts.reserve(values.size());  // their addresses must not change
     for (const cell &value : values) {
         const auto *number = std::get_if<int64_t>(&value);
         const auto *text = std::get_if<std::string>(&value);
@@ -117,7 +117,7 @@ std::string set_version_statement(int version) {
     return "COMMENT ON TABLE songs IS 'tavo, version " + std::to_string(version) + "'";
 }
 
-// An index entry takes a third of a page of 8 KiB.
+// An index entry can have a third of a page of 8 KiB.
 constexpr database_kind kPostgresql = {
     "BYTEA",
     "TIMESTAMPTZ",
@@ -133,7 +133,7 @@ constexpr database_kind kPostgresql = {
 
 }  // namespace
 
-// Found by name in the module that this file is.
+// Looked up by name in this module.
 extern "C" const database_kind *tavo_postgresql_database() {
     return &kPostgresql;
 }

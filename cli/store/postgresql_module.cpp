@@ -1,4 +1,4 @@
-// PostgreSQL's client library brings two dozen others: it is loaded when a store asks for it.
+// Loads the module with PostgreSQL's client library, which depends on two dozen others, on demand.
 #include <dlfcn.h>
 
 #include "cli/store/database.h"

@@ -13,12 +13,12 @@ namespace {
 
 using nlohmann::json;
 
-// A column beside the key and the file's state, and the key of the result that it holds.
+// A column with a part of the result, and the part's key in JSON.
 struct result_column {
     const char *name;
     const char *type;  // null: the database's type for JSON
     const char *key;
-    int version;  // of the table, the first with the column
+    int version;  // first version of the table with this column
 };
 constexpr result_column kResultColumns[] = {
     {"status", "TEXT NOT NULL", "status", 1},
@@ -73,8 +73,8 @@ std::string host_name() {
     return as_utf8(name.data());
 }
 
-// A number, or a list of numbers; anything nested deeper is dropped while it is read, so that its
-// depth costs nothing.
+// Parses a number or a list of numbers. Drops deeper levels while reading, so that their depth
+// costs nothing.
 json parse_numbers(const std::string &text) {
     const auto is_flat = [](int depth, json::parse_event_t event, const json &) {
         return event == json::parse_event_t::value ||
@@ -89,7 +89,7 @@ bool are_numbers(const json &value) {
                        [](const json &item) { return item.is_number(); });
 }
 
-// False if no tavo wrote the cell.
+// Returns false if the cell is damaged.
 bool read_cell(const cell &value, const result_column &column, json &result) {
     if (std::holds_alternative<std::monostate>(value)) return true;
     const auto *number = std::get_if<int64_t>(&value);

@@ -6,7 +6,7 @@
 
 namespace {
 
-constexpr int kBusyMs = 2000;  // several processes may write to one file
+constexpr int kBusyMs = 2000;  // wait while another process writes to the file
 
 bool is_permanent(int code) {
     switch (code & 0xFF) {
@@ -29,17 +29,17 @@ int connect(const std::string &name, int flags, sqlite3 **db) {
     int code = sqlite3_open_v2(name.c_str(), db, flags, nullptr);
     if (code != SQLITE_OK) return code;
     sqlite3_busy_timeout(*db, kBusyMs);
-    // A write-ahead log lets readers go on, and survives a kill at any moment.
+    // With a write-ahead log others can read meanwhile, and a kill at any moment is harmless.
     const char *first = (flags & SQLITE_OPEN_READONLY) != 0
                             ? "SELECT count(*) FROM sqlite_master"
                             : "PRAGMA journal_mode=WAL; PRAGMA synchronous=NORMAL";
     code = sqlite3_exec(*db, first, nullptr, nullptr, nullptr);
-    // A file that cannot be written says so at the first statement that changes it.
+    // A file that cannot be written fails at the first statement that changes it.
     return (flags & SQLITE_OPEN_READONLY) != 0 ? code : SQLITE_OK;
 }
 
-// In a folder that cannot be written SQLite reads a file with a write-ahead log only if it is told
-// that nothing changes; without the log's file there is nothing in it.
+// In a read-only folder SQLite opens a database with a write-ahead log only as immutable, which
+// ignores the log. That is safe if the log is empty.
 bool has_empty_log(const std::string &location) {
     struct stat info {};
     return stat((location + "-wal").c_str(), &info) != 0 || info.st_size == 0;

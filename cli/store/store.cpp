@@ -27,7 +27,7 @@ constexpr int64_t kFirstWaitMs = 500;  // doubled each time
 constexpr int64_t kLongestWaitMs = 30'000;
 constexpr int64_t kPageRows = 500;
 
-// The key's cells, in its order.
+// The four values of the key, in order.
 row key_of(const store &db, const std::string &path) {
     return {bytes{path}, std::string(mode_word(db.opts.mode)), int64_t{db.opts.length_s},
             int64_t{db.opts.max_beats}};
@@ -60,7 +60,7 @@ failure give_up(store &db, const failure &failed) {
     return {"the store is given up: " + public_text(db, failed) + "."};
 }
 
-// Runs the work until it succeeds, on a new connection after each failure that may pass.
+// Runs the work until it succeeds. Connects again after each temporary failure.
 failure persist(store &db, const std::function<failure()> &work) {
     const auto start = steady_clock::now();
     for (int64_t wait_ms = kFirstWaitMs;; wait_ms = std::min(2 * wait_ms, kLongestWaitMs)) {
@@ -97,7 +97,7 @@ failure upgrade(store &db) {
     for (size_t i = 0; i < statements.size(); ++i) {
         if (failure failed = run(db, statements[i])) return failed;
     }
-    failure failed = read_version(db);  // another command may have done it meanwhile
+    failure failed = read_version(db);  // another command may have upgraded it meanwhile
     if (!failed && db.version < kTableVersion) {
         for (const std::string &statement : upgrade_statements(*db.kind)) {
             if (!failed) failed = run(db, statement);

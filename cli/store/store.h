@@ -17,7 +17,7 @@
 #include "cli/options.h"
 #include "cli/store/database.h"
 
-// Distinguishes a file from a later one of the same name.
+// Distinguishes a file from a later version of it.
 struct file_state {
     int64_t size = 0;      // bytes
     int64_t mtime_ns = 0;  // last change, since 1970
@@ -30,23 +30,23 @@ struct stored_song {
     std::string path;    // any bytes
     file_state file;     // before the analysis
     std::string result;  // the object of --format json
-    failure damage;      // of a row read: a column that no tavo wrote
+    failure damage;      // of a row that was read: it is damaged
 };
 
 struct store {
     options opts;
     const database_kind *kind = nullptr;  // null without --store
     std::string location;
-    void *handle = nullptr;          // null while there is no connection
-    int version = 0;                 // of the table, as it was found
-    bool has_failed = false;         // given up; the run ends
+    void *handle = nullptr;          // null while disconnected
+    int version = 0;                 // of the table
+    bool has_failed = false;         // the store was given up, and the run ends
     std::vector<stored_song> batch;  // not committed yet
     std::chrono::steady_clock::time_point batch_since;
-    std::deque<stored_song> page;  // with --from-store: rows read and not yet returned
+    std::deque<stored_song> page;  // with --from-store: rows that were read, not yet returned
     std::string last_path;         // of the page
     int64_t stored = 0;            // rows committed
-    int64_t known = 0;             // songs left out because they are stored
-    int64_t known_failed = 0;      // of these, those that are stored as failed
+    int64_t known = 0;             // songs skipped because they are stored
+    int64_t known_failed = 0;      // of these, songs stored as failed
 };
 
 // These try again while the database does not answer, waiting longer each time, for --patience;
@@ -56,12 +56,12 @@ struct store {
 // Connects and, unless the store is only read, makes or upgrades the table. Does not try again.
 failure open_store(store &db, const options &opts);
 
-// True in is_new if the song is to be analysed: it is not stored for these parameters as it is now,
-// or the options ask for it again.
+// Sets is_new if the song must be analysed: its current file is not stored for these parameters, or
+// the options ask for it again.
 failure find_song(store &db, const std::string &path, file_state &file, bool &is_new);
 
-// Adds a result to the batch, which is committed once it is full or old. After the store was given
-// up, results are kept for close_store.
+// Adds a result to the batch and commits the batch if it is full or old. Once the store was given
+// up, results stay in the batch for close_store.
 failure add_song(store &db, stored_song &&song);
 
 // Commits a batch that is old.
@@ -73,7 +73,7 @@ int batch_timeout_ms(const store &db);  // until then, for poll; -1 for never
 failure read_next(store &db, stored_song &song, bool &found);
 
 // Commits what is left and closes. Results that could not be stored go to standard output as JSON.
-// summary is what to tell the user.
+// summary: a line for the user.
 failure close_store(store &db, std::string &summary);
 
 #endif

@@ -84,7 +84,7 @@ class Inputs(Case):
                 ("music/b.txt --files-from list", b"", [b, a]),
                 ("-", b"\xef\xbb\xbf#EXTM3U\r\n#EXTINF:60,Song\r\nmusic/a.wav\r\n\r\n#1.wav\r\n", [a, b"#1.wav"])):
             self.assertEqual(self.found(*words.split(), input=text), expected, text)
-        for words, text, said in (  # what is no list
+        for words, text, said in (  # not a list
                 ("-", sound, b"sound (WAV), not a list"), ("-0 -", sound, b"sound (WAV)"),
                 ("--files-from music/a.wav", b"", b"name it as FILE"),
                 ("--files-from nowhere", b"", b"list of files cannot be read"),

@@ -1,4 +1,4 @@
-"""Results in a database: once each, whatever happens, and the same as without."""
+"""Results in a database: each song once, whatever happens, with the same result as without a store."""
 import json
 import os
 import random
@@ -7,7 +7,7 @@ import time
 
 from command_case import AS_ORDINARY_USER, Case, send, short_song
 
-KEYS = ("status", "sample_rate", "channels", "duration_ms", "hl_pos_ms", "bpm", "beats_ms")
+KEYS = ("status", "sample_rate", "channels", "duration_ms", "offset_ms", "hl_pos_ms", "bpm", "beats_ms")
 STORE = ("--store", "x.db")
 
 
@@ -41,7 +41,7 @@ class Store(Case):
             self.assert_same(row, result)
             self.assertEqual([row[key] for key in ("size", "mtime_ns", "mode", "length_s", "max_beats")],
                              [state.st_size, state.st_mtime_ns, "both", 5, 0])
-        # Known, the failed one too.
+        # All are known, the failed one too.
         self.run_tavo("--store", "sqlite:x.db", "--format", "json", *words, status=1,
                       said=b"0 stored, 3 known already (1 failed; --retry-failed)", printed=b"")
 
@@ -114,20 +114,20 @@ class Store(Case):
         self.assertEqual(self.run_json(*STORE, "--from-store", "--length", "5", before=AS_ORDINARY_USER), expected)
 
     def test_markers_of_a_run_that_was_killed(self):
-        """Their songs were analysed, and their rows lost."""
+        """They were written, but the rows of their songs were lost."""
         names = self.put_songs(3)
         words = (*STORE, "--format", "labels", *names)
         self.run_tavo(*words)
         for path in self.folder.glob("x.db*"):
             path.unlink()
         self.put("song 1.wav.labels.txt", b"of somebody else\n")
-        for stored, known in ((2, 0), (0, 2)):  # the third is no failed song: it is tried again
+        for stored, known in ((2, 0), (0, 2)):  # song 1 is not stored as failed: it is tried again
             self.run_tavo(*words, status=1, said=b"song 1.wav: The file song 1.wav.labels.txt exists already")
             self.assertEqual([row["status"] for row in self.rows().values()], ["ok"] * 2)
         self.run_tavo(*words, "--force", said=b"1 stored, 2 known")
 
     def test_a_store_of_the_first_version(self):
-        """Of a tavo before offset_ms and decoder; with rows that were damaged since."""
+        """It has no offset_ms and decoder, and its rows may be damaged."""
         self.put("a.wav")
         self.put("bad.wav", content=b"RIFF" + bytes(60))
         self.run_tavo(*STORE, "a.wav", "bad.wav", status=1)
@@ -149,7 +149,7 @@ class Store(Case):
         self.assertEqual(self.objects(done.stdout)[0]["beats_ms"], expected["beats_ms"])
         sentence = self.rows()[b"bad.wav"]["sentence"]
         self.run_tavo(*STORE, "--from-store", "--failed", printed=f"bad.wav: {sentence}\n".encode())
-        self.run_tavo(*STORE, "a.wav", said=b"1 known")  # which brings it up to date
+        self.run_tavo(*STORE, "a.wav", said=b"1 known")  # this upgrades the table
         with sqlite3.connect(self.folder / "x.db") as db:
             self.assertEqual(db.execute("SELECT count(offset_ms), count(decoder) FROM songs").fetchone(), (0, 0))
             db.execute("PRAGMA user_version = 99")

@@ -1,4 +1,4 @@
-"""Several files at once, workers that die, the user who stops, readers who go away."""
+"""Several files at once: workers that die, stops, and readers of the results that end."""
 import contextlib
 import math
 import os
@@ -17,7 +17,7 @@ def children(process):
 
 
 def open_files(pid):
-    """What the descriptors of a process lead to, of those that stay open while we look."""
+    """The targets of a process's descriptors, except those that are closed meanwhile."""
     for entry in Path(f"/proc/{pid}/fd").glob("*"):
         with contextlib.suppress(OSError):
             yield int(entry.name), os.readlink(entry)
@@ -27,7 +27,7 @@ class Workers(Case):
     def setUp(self):
         super().setUp()
         self.put("a.wav")
-        # Ten minutes of the same value over and over: what counts is how long they take.
+        # Ten minutes of one value: only the time that they take matters.
         self.put("long.wav", wav(seconds=600, rate=48000, channels=2))
         os.link(self.folder / "long.wav", self.folder / "other.wav")
 
@@ -63,7 +63,7 @@ class Workers(Case):
                                 ("././a.wav", "ok"))
             self.assertIn("signal 9", self.objects(out)[1]["error"])
             self.assertIn(b"signal 9", err)
-        process = self.start("-")  # one without a file costs none, and is told
+        process = self.start("-")  # the death of an idle worker costs no file and is reported
         send(process, b"a.wav\n")
         self.assert_results(process.stdout.readline(), ("a.wav", "ok"))
         os.kill(*children(process), signal.SIGKILL)
@@ -73,7 +73,7 @@ class Workers(Case):
         self.assertEqual(process.returncode, 1)
 
     def test_workers_end_with_the_command_and_share_no_pipes(self):
-        # A pipe's end is a signal: it must not depend on another worker's life.
+        # The end of a pipe is a signal, so no other worker may hold the pipe open.
         process = self.start("-j", "2", "long.wav", "other.wav")
         workers = [self.worker_with(process, name) for name in ("long.wav", "other.wav")]
         pipes = [{to for fd, to in open_files(pid) if fd > 2 and to.startswith("pipe:")} for pid in workers]
@@ -86,7 +86,7 @@ class Workers(Case):
                 self.assertTrue(select.select([end], [], [], 60)[0], "the worker goes on")
 
     def test_a_stop_keeps_what_is_finished(self):
-        # As kill does, as the terminal does; results that wait behind the file that is stopped.
+        # Sent by kill, by the terminal; with results that wait for the file that is stopped.
         for send, number, words, busy, finished in (
                 (os.kill, signal.SIGTERM, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
                 (os.killpg, signal.SIGINT, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
@@ -109,7 +109,7 @@ class Workers(Case):
         self.assert_only("a.wav", "long.wav", "other.wav")
 
     def test_a_worker_that_hangs(self):
-        """It is ended after a second of a stop, or --timeout; what it was writing is removed."""
+        """It is killed a second after a stop, or after --timeout; its temporary file is removed."""
         for words, number, sentence in (("", signal.SIGTERM, b"stopped; 0 of 1 file"),
                                         ("--timeout 1", None, b"long.wav: The analysis took more than 1 s")):
             process = self.start("--click", "c.wav", *words.split(), "long.wav")
@@ -125,7 +125,7 @@ class Workers(Case):
             self.assert_only("a.wav", "long.wav", "other.wav")
 
     def test_a_list_that_is_being_read(self):
-        """A stop and a reader gone end the wait for the next name."""
+        """A stop and the end of the reader end the wait for the next name."""
         for end, status in ((lambda process: process.send_signal(signal.SIGINT), 128 + signal.SIGINT),
                             (lambda process: process.stdout.close(), 128 + signal.SIGPIPE)):
             process = self.start("-")
@@ -135,8 +135,8 @@ class Workers(Case):
             self.assertEqual(process.wait(timeout=60), status)
 
     def test_a_reader_gone(self):
-        """The work ends, without a word, with the status of a broken pipe."""
-        for words, form in ((["long.wav"] * 400, "json"), (["a.wav"], "csv")):  # a head comes before the first result
+        """The command ends without a message and with the status of a broken pipe."""
+        for words, form in ((["long.wav"] * 400, "json"), (["a.wav"], "csv")):  # CSV starts with a head
             process = self.start(*words, form=form)
             process.stdout.close()
             _, err = process.communicate(timeout=60)  # all 400 take minutes
