@@ -45,11 +45,16 @@ bool has_empty_log(const std::string &location) {
     return stat((location + "-wal").c_str(), &info) != 0 || info.st_size == 0;
 }
 
+// SQLite's codes if it cannot create the log: the second one if its user may not write there.
+bool lacks_log(int code) {
+    return (code & 0xFF) == SQLITE_CANTOPEN || (code & 0xFF) == SQLITE_READONLY;
+}
+
 failure open_file(const std::string &location, bool read_only, void **handle) {
     sqlite3 *db = nullptr;
     const int flags = read_only ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
     int code = connect(location, flags, &db);
-    if (read_only && code == SQLITE_CANTOPEN && has_empty_log(location)) {
+    if (read_only && lacks_log(code) && has_empty_log(location)) {
         sqlite3_close(db);
         const std::string host = location[0] == '/' ? "file://" : "file:";
         code = connect(host + percent_encoded(location) + "?immutable=1", flags | SQLITE_OPEN_URI,
