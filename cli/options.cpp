@@ -260,7 +260,10 @@ void declare_catalogue(CLI::App &app, options &out, raw_values &raw) {
                    "Keep the results in a database: sqlite:FILE, FILE.db or "
                    "postgresql://HOST/DATABASE. Songs that it knows are left out; standard output "
                    "is used only with --format")
-        ->type_name("URL");
+        ->type_name("URL")
+        ->check([](const std::string &url) {
+            return url.empty() ? std::string("it has no name") : std::string();
+        });
     app.add_flag("--retry-failed", out.retry_failed, "Analyse songs again that failed");
     app.add_flag("--redo", out.redo, "Analyse every song again");
     app.add_flag("--from-store", out.from_store,

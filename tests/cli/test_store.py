@@ -107,7 +107,10 @@ class Store(Case):
         start, end = (expected[1][key] / 1000 for key in ("hl_pos_ms", "hl_end_ms"))
         self.assertIn(f"{start:.6f}\t{end:.6f}\thighlight", (self.folder / "song 1.wav.labels.txt").read_text())
         self.run_tavo(*STORE, "--from-store", status=2)
-        # The store and its folder need not be writable.
+        self.run_tavo("--store", "", "--format", "json", names[0], status=2, said=b"--store", printed=b"")
+        # The store and its folder need not be writable, and it needs no log there.
+        for path in self.folder.glob("x.db-*"):
+            path.unlink()
         (self.folder / "x.db").chmod(0o444)
         self.folder.chmod(0o555)
         self.addCleanup(self.folder.chmod, 0o700)
