@@ -147,7 +147,7 @@ struct raw_values {
 };
 
 // The parser takes a value in square brackets apart at its commas, which a file name must survive:
-// such an argument travels behind a byte that takes its bracket off the first place.
+// such an argument travels after a byte that takes its bracket off the first place.
 constexpr char kShield = '\x01';
 
 std::vector<std::string> shielded(int argc, char **argv) {
@@ -315,7 +315,7 @@ void set_values(const raw_values &raw, options &out) {
     if (raw.null_separated) out.list_separator = '\0';
 }
 
-// What is wrong with the options about the store.
+// Returns the error in the options about the store; empty if there is none.
 std::string catalogue_contradiction(const options &out) {
     const bool nothing_named = out.inputs.empty() && out.lists.empty();
     if (out.store.empty() && (out.from_store || out.redo || out.retry_failed)) {
@@ -349,7 +349,7 @@ std::string clip_contradiction(const options &out) {
     return stem(name) != name ? "" : "--clip needs a folder, or a name with an ending: clip.mp3.";
 }
 
-// What is wrong with options that are right by themselves. Empty when all is well.
+// Returns the error in a combination of valid options; empty if there is none.
 std::string contradiction(const options &out, const raw_values &raw) {
     const bool list_on_stdin =
         std::find(out.inputs.begin(), out.inputs.end(), "-") != out.inputs.end();

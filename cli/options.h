@@ -67,7 +67,7 @@ constexpr int kExitSignal = 128;  // plus the number of the signal that stopped 
 // Returns the exit status when the command is done already (help, version, wrong usage).
 std::optional<int> parse_options(int argc, char **argv, options &out);
 
-// Whether the one input is a file, neither a folder nor a list.
+// True if the one input is a file, neither a folder nor a list.
 bool takes_one_file(const options &opts);
 
 #endif

@@ -40,7 +40,7 @@ T *zeroed_items(int64_t count) {
     return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
 }
 
-// Whether a job lacks part of its audio or of its search, because a read or an allocation has
+// True if a job lacks part of its audio or of its search, because a read or an allocation has
 // failed since tavo_decode_init cleared the mark. Process-wide, as the decoding is: one instance at
 // a time.
 bool is_incomplete();

@@ -24,7 +24,7 @@ bool is_instance(const TAVO_CTX *ctx);
 // True once the job has set its final state.
 bool has_ended(const TAVO_CTX *ctx);
 
-// Whether a mode finds beats, or a highlight. Both are false for a mode outside 0 to 2.
+// True if a mode finds beats, or a highlight. Both are false for a mode outside 0 to 2.
 inline bool finds_beats(int32_t mode) {
     return mode == TAVO_MODE_BEATS || mode == TAVO_MODE_BOTH;
 }

@@ -198,15 +198,15 @@ int32_t tavo_get_stream(const TAVO_CTX *ctx, int32_t *rate, int32_t *channels,
  * before the job's end, after a failure, in mode 0, or for a bad handle. */
 int32_t tavo_get_tempo(const TAVO_CTX *ctx);
 
-/** Whether the job could decode any audio: call it in the callback or after it. A highlight at 0 of
- * a file without any is no result. Returns 1; 0 before the job's end, if nothing was decoded, or
- * for a bad handle. */
+/** Reports whether the job could decode any audio: call it in the callback or after it. A highlight
+ * at 0 of a file without any is no result. Returns 1; 0 before the job's end, if nothing was
+ * decoded, or for a bad handle. */
 int32_t tavo_has_audio(const TAVO_CTX *ctx);
 
-/** Whether the job decoded the file to its end: call it in the callback or after it. A result is
- * delivered even if the file could not be read to its end or memory ran out; it then holds for the
- * part that was analysed. Returns 1; 0 before the job's end, if something is missing, or for a bad
- * handle. */
+/** Reports whether the job decoded the file to its end: call it in the callback or after it. A
+ * result is delivered even if the file could not be read to its end or memory ran out; it then
+ * holds for the part that was analysed. Returns 1; 0 before the job's end, if something is missing,
+ * or for a bad handle. */
 int32_t tavo_is_complete(const TAVO_CTX *ctx);
 
 /** The loudness curve of the file, once a job of mode 0 or 2 has ended: value i is taken over the

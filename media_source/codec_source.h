@@ -13,9 +13,9 @@
 constexpr int32_t kBitsPerSample = 16;   // of every stream's format
 constexpr int32_t kReducedChannels = 2;  // of AAC and FLAC decoders, which are asked for stereo
 
-// Where frames come from: a container, or the reader of a bare stream.
+// The source of frames: a container, or the reader of a bare stream.
 struct container_ops {
-    // Of the demuxer's stream, or of the bare stream's reader.
+    // Handle of the demuxer's stream, or of the bare stream's reader.
     int32_t (*get_frm)(void *stream, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                        int64_t *second);
     int32_t (*seek)(void *stream, const int64_t *position, int64_t *reached);

@@ -1,4 +1,4 @@
-// Which format source serves a type code of recognition. Called by the frame, mtsrc.cpp.
+// Maps a type code of recognition to its format source. Called by the frame, mtsrc.cpp.
 #ifndef TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
 #define TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
 

@@ -118,7 +118,7 @@ bool leave_folder(input_supply &supply, input &out) {
     return false;
 }
 
-// Whether the file is to be analysed or reported; code receives errno when it cannot be read.
+// True if the file is to be analysed or reported; code receives errno when it cannot be read.
 bool is_audio(const std::string &path, const options &opts, int &code) {
     file_kind kind = file_kind::unknown;
     code = recognise(path, kind);

@@ -14,10 +14,10 @@ struct shard {
 
 // "I/N", I from 1 to N; or "auto": from the environment of a Slurm array (SLURM_ARRAY_TASK_*), a
 // Kubernetes indexed job (JOB_COMPLETION_INDEX) or an AWS Batch array (AWS_BATCH_JOB_ARRAY_*).
-// Where the engine does not tell N, TAVO_SHARDS does.
+// If the engine does not state N, TAVO_SHARDS must.
 failure read_shard(const std::string &words, shard &out);
 
-// Whether the file belongs to the share: by a hash of the path's bytes that is the same everywhere.
+// True if the file belongs to the share: by a hash of the path's bytes that is the same everywhere.
 bool in_shard(const shard &of, const std::string &path);
 
 #endif

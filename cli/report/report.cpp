@@ -23,7 +23,7 @@ namespace {
 constexpr int kMiniatureWidth = 140;
 constexpr int kMiniatureHeight = 28;
 
-// Where a page finds its song.
+// The song's file as a page refers to it.
 struct report_sound {
     std::string link;      // relative URL; empty when the sound is inside the page
     std::string embedded;  // the file's bytes as base64
@@ -143,7 +143,7 @@ std::string report_page(const record &result, const song_view &view, const repor
     if (!sound.note.empty()) song["note"] = sound.note;
     song[sound.link.empty() ? "embedded" : "audio"] =
         sound.link.empty() ? sound.embedded : sound.link;
-    // In this order nothing of a song is taken for a key: the title stands before the data.
+    // In this order no text of a song is mistaken for a key: the title comes before the data.
     const std::string title = html_text(base_name(result.file));
     return filled(filled(kSongPage, "@DATA@", script_json(song)), "@TITLE@", title);
 }
@@ -155,7 +155,7 @@ std::string pages_folder(const options &opts) {
            name.substr(0, std::min(name.rfind('.'), name.size())) + "_songs";
 }
 
-// The index page before or behind its rows.
+// The index page before or after its rows.
 std::string index_part(bool before) {
     const std::string page = kIndexPage;
     const std::string key = "@ROWS@";

@@ -8,7 +8,7 @@
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// What comes before the first record; empty for most formats.
+// The text before the first record; empty for most formats.
 std::string format_head(result_format format);
 
 // One record; empty when the format has nothing to say about it on standard output.

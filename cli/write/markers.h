@@ -24,7 +24,7 @@ double region_end_ms(const record &result);
 // All marks of a song, the highlight first.
 std::vector<mark> marks_of(const record &result);
 
-// Whether the format writes a file for each input.
+// True if the format writes a file for each input.
 bool writes_files(result_format format);
 
 // The marker file of an input. A name too long for a file system is cut and numbered.

@@ -11,7 +11,7 @@ struct output_file {
     int fd = -1;            // open for writing, -1 once closed
 };
 
-// Whether both paths lead to one existing file.
+// True if both paths lead to one existing file.
 bool same_file(const std::string &a, const std::string &b);
 
 // These return an empty string or a sentence that says what failed.

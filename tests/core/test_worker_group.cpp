@@ -58,7 +58,7 @@ TEST(WorkerGroup, EveryWorkerRunsOnceWhateverCanBeStarted) {
     }
     for (int round = 0; round < 500; ++round) {  // the flags of one round are stale in the next
         SCOPED_TRACE(round);
-        const int refused = round % 5;  // this worker, or none, in turn with those behind it
+        const int refused = round % 5;  // this worker and the later ones, or none
         const bool forever = round % 2 != 0;
         fault::arm({fault::kThread, refused, forever});
         finished = 0;

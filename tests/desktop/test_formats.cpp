@@ -85,7 +85,7 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
         {"fragments.mp4", "low.aac"},
         {"video.mp4", "low.aac"},
         {"video.ogv", "song.ogg"},
-        // Of a mono stream the bare source drops nothing and averages nothing.
+        // The bare source drops and averages nothing of a mono stream.
         {"layer3.mp4", "mono.mp3"},
         // Vorbis is cut at its granule positions.
         {"golden/late.ogg", "golden/plain.ogg"},
@@ -105,7 +105,7 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
     EXPECT_EQ(read_all(fixture("golden/layer1_48.mp1")).size(), 20U * 384);
 }
 
-// What ffmpeg makes of a song's channels, rounded to 16 bits.
+// ffmpeg's downmix of a song, rounded to 16 bits.
 samples mixed(const std::string &song, const std::string &channels) {
     const std::string path = save("mixed.raw", "");
     const std::string command = "ffmpeg -nostdin -v error -y -i " + fixture(song) +

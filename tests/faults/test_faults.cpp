@@ -166,7 +166,7 @@ INSTANTIATE_TEST_SUITE_P(Jobs, Faults,
                          testing::Combine(testing::ValuesIn(kFormats),
                                           testing::Values(kOpenedOnly, 0, 1, 2)));
 
-// A path that stands for a descriptor, which every source duplicates. Duplicates share one offset:
+// A path that names a descriptor, which every source duplicates. Duplicates share one offset:
 // a song that is decoded in one part is read by one of them at a time.
 TEST(FaultsOfFiles, Duplicates) {
     const int input = dup(STDIN_FILENO);

@@ -1,6 +1,6 @@
 // A Java virtual machine made of a function table: it knows one class with one method, counts what
-// it has handed out, and can be told which function fails. The rules of the interface are tested in
-// a real machine. Included by one file only.
+// it has handed out, and a test chooses which function fails. The rules of the interface are tested
+// in a real machine. Included by one file only.
 #ifndef TAVO_TESTS_JNI_FAKE_VM_H
 #define TAVO_TESTS_JNI_FAKE_VM_H
 
@@ -31,7 +31,7 @@ std::atomic<int> global_references, lent, methods;
 std::atomic<bool> pending;  // an exception
 std::atomic<int> wrong;     // calls while one is pending
 
-// What a test tells the machine, and what it has seen.
+// A test's settings of the machine, and what the machine has recorded.
 struct {
     // The n-th call of a function from now on fails (1 the next one) as the interface says: null
     // with an exception pending, or an error code. For CallStaticVoidMethod: the method throws.

@@ -58,7 +58,8 @@ TEST_F(Reading, FrameDecoderQueue) {
 // failures of the reader and impossible counts do: what was queued is kept.
 TEST_F(Reading, FailuresAndFramesWithoutPcm) {
     for_each_row([&](const source_row &row) {
-        const int32_t too_much = 1'048'575 + (row.codec == 322 ? 131'070 : 0);  // behind a frame
+        const int32_t too_much =
+            1'048'575 + (row.codec == 322 ? 131'070 : 0);  // past the end of a frame
         const struct {
             frames bad;  // between groups of 2 and 6
             int32_t code;
@@ -85,7 +86,7 @@ TEST_F(Reading, FailuresAndFramesWithoutPcm) {
             EXPECT_EQ(scripted::calls_of("_reset").size(), each.resets);
         }
     });
-    scripted::script empty_frames;  // for ever
+    scripted::script empty_frames;  // forever
     empty_frames.last.result = 0;
     ASSERT_EQ(open_row(row_of("wav"), empty_frames), 0);
     EXPECT_EQ(read(2).first, -6);
@@ -95,7 +96,7 @@ TEST_F(Reading, ReductionsAndTheDelayOfMpegDecoders) {
     const samples pcm = {-3, 0, 3, 0, 32767, 32767, -32768, -32768, 32767, -32768, 7, 8};
     const samples first = {-3, 3, 32767, -32768, 32767, 7};
     const samples first_of_three = {-3, 0, -32768, -32768};
-    samples late(1058, 1), kept(529, 1);  // one stereo group behind the decoder's delay
+    samples late(1058, 1), kept(529, 1);  // one stereo group after the decoder's delay
     late.insert(late.end(), {7, 7});
     kept.push_back(7);
     // 7 and 6 bytes: a sample each, and 3 bytes that count. The second goes to an odd place.

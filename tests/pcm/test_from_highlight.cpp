@@ -47,7 +47,7 @@ TEST_F(FromHighlight, FirstSecondIsTheStartOfTheFile) {
     expect_from(1001, slice(stream, 16'016, kBytes), 1001);
     EXPECT_EQ(sources[0].seeks, positions{10'010'000});
     decode(stream);
-    sources[0].seek_fails = true;  // the source stands behind its segment, at byte 112,000
+    sources[0].seek_fails = true;  // the source is past its segment, at byte 112,000
     expect_from(2500, slice(stream, 40'000, kBytes), 2500);
     EXPECT_EQ(sources[0].seeks, (positions{25'000'000, 25'000'000}));
 }

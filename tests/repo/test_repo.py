@@ -26,7 +26,7 @@ ALLOWED = {  # each folder and the floors below it that it may include
 SINGLE = {  # headers that a folder may take from one it may not include otherwise
     # The waveform of a page and the margins of the search, which the public interface does not have.
     "cli": {"media_source/mtsrc.h", "highlight/search.h"},
-    # The stand-in takes the codec library's interface and nothing else.
+    # The desktop implementation includes the codec library's interface and nothing else.
     "desktop": {"android/log.h", "media_source/wexaaudio.h", "media_source/mtsrc_io.h"},
 }
 # A codec of a package in this list would tie the library to that package.
@@ -104,7 +104,7 @@ class Repository(unittest.TestCase):
         self.assertEqual(len(names), len(set(names)))
         self.assertEqual(flaws_of(LIBRARY, names), set())
         self.assertEqual(flaws_of(LIBRARY, {"tavo_other", *names} - {"tavo_init"}), {"tavo_other", "tavo_init"})
-        # The C library has thread-local storage, a module of the stand-in needs the codecs of a package.
+        # The C library has thread-local storage, a module of the desktop codec library needs the codecs of a package.
         libc = re.search(r"\S+/libc\.so\S*", pathlib.Path("/proc/self/maps").read_text())[0]
         self.assertIn("TLS", flaws_of(libc, []))
         self.assertIn("libav", " ".join(flaws_of(LIBRARY.parent / "libwexaaudio_av.so", [])))

@@ -11,7 +11,7 @@ namespace scripted {
 namespace {
 
 constexpr size_t kCallsKept = 1000;
-constexpr int kMostRepeats = 1000;  // while tampering: an end that is hidden for ever is a failure
+constexpr int kMostRepeats = 1000;  // while tampering: an end that is hidden forever is a failure
 
 std::mutex guard;
 
@@ -43,7 +43,7 @@ int32_t fault(const std::string &reason) {
     return -1;
 }
 
-// What the call hands back for a value of that name.
+// The call's answer for a value of that name.
 template <typename number>
 number told(const char *value, number truth) {
     if (!all.tamper) return truth;
@@ -65,7 +65,7 @@ std::string kind_of_call() {
     return name.substr(0, name.find('_'));
 }
 
-// The object behind the handle when it is alive and of that kind; else null and a fault.
+// Returns the handle's object if it is alive and of that kind; else null, and records a fault.
 object *checked(const void *handle, const std::string &kind = kind_of_call()) {
     for (object &each : all.alive) {
         if (&each == handle && each.kind == kind) return &each;

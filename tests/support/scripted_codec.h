@@ -41,7 +41,7 @@ struct script {
     std::vector<int32_t> kinds = {kWexaKindAudio};  // MP4 tracks, Ogg streams
     std::optional<int32_t> kind_count = {};         // reported in place of kinds.size()
     std::vector<frame> frames = {};
-    frame last = {{}, 0, kWexaEndOfStream};    // read again and again behind the frames
+    frame last = {{}, 0, kWexaEndOfStream};    // read again and again after the frames
     std::vector<seek> seeks = {};              // the first answers, for each reader anew
     std::string setup = "123";                 // Vorbis set-up data
     std::optional<int32_t> setup_length = {};  // reported in place of setup.size()

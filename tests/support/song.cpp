@@ -24,7 +24,8 @@ constexpr double kAccent = 1.35;
 constexpr double kSwellSeconds = 4.0;
 constexpr double kSwell = 0.15;
 constexpr double kFadeSeconds = 0.01;  // of the bed where the gain changes: no click of its own
-// Each chord is the second, third and fourth harmonic of its root: the bed's spectrum stands still.
+// Each chord is the second, third and fourth harmonic of its root: the bed's spectrum does not
+// change.
 constexpr double kRootHz[4] = {110.0, 123.47, 98.0, 130.81};
 
 // xorshift, state never 0. Uniform in [-1, 1).

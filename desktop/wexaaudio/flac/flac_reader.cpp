@@ -38,7 +38,7 @@ struct flac_stream {
     bool damaged;                  // the frame being decoded has a wrong check sum
 };
 
-// What a scan finds.
+// The result of a scan.
 struct flac_extent {
     int32_t rate;  // Hz
     int64_t base;  // number of the stream's first sample

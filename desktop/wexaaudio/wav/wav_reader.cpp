@@ -23,7 +23,7 @@ constexpr int32_t kTagExtensible = 0xFFFE;
 constexpr int32_t kTagCollision = 0x10000;  // distinguishes a file's own tag 300 from kWexaPcm
 constexpr int32_t kSampleBytes = 2;
 
-// What follows the format tag in the sub-format of an extensible header.
+// The bytes after the format tag in the sub-format of an extensible header.
 constexpr uint8_t kSubFormatTail[14] = {0, 0, 0, 0, 0x10, 0, 0x80, 0, 0, 0xAA, 0, 0x38, 0x9B, 0x71};
 
 struct wav_reader {
