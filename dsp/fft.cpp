@@ -42,42 +42,79 @@ void permute(T *re, T *im, int32_t n, const uint32_t *bit_reverse) {
 }
 
 template <typename T>
-inline void butterfly(T *re, T *im, size_t top, size_t bottom, double w_re, double w_im) {
-    const T t_re = re[bottom] * w_re - im[bottom] * w_im;
-    const T t_im = re[bottom] * w_im + im[bottom] * w_re;
-    const T top_re = re[top];
-    const T top_im = im[top];
-    re[bottom] = top_re - t_re;
-    im[bottom] = top_im - t_im;
-    re[top] = top_re + t_re;
-    im[top] = top_im + t_im;
+struct complex {
+    T re;
+    T im;
+};
+
+// The data of one transform. T is double, or double_pair for two transforms side by side.
+template <typename T>
+struct spectrum {
+    T *re;
+    T *im;
+};
+
+template <typename T>
+inline complex<T> load(const spectrum<T> &x, size_t i) {
+    return {x.re[i], x.im[i]};
 }
 
-// Radix 2, decimation in time. T is double, or double_pair for two transforms in one pass. The
-// butterflies of a stage are independent: the longer of its two loops is the inner one.
+template <typename T>
+inline void store(const spectrum<T> &x, size_t i, complex<T> value) {
+    x.re[i] = value.re;
+    x.im[i] = value.im;
+}
+
+// top becomes top + w * bottom, bottom becomes top - w * bottom.
+template <typename T>
+inline void butterfly(complex<T> *top, complex<T> *bottom, double w_re, double w_im) {
+    const complex<T> t = {bottom->re * w_re - bottom->im * w_im,
+                          bottom->re * w_im + bottom->im * w_re};
+    *bottom = {top->re - t.re, top->im - t.im};
+    *top = {top->re + t.re, top->im + t.im};
+}
+
+// Radix 2, decimation in time. Each pass over the data runs two stages, on four elements at a time,
+// so that they stay in registers between the stages; of an odd number of stages, the first has a
+// pass of its own.
 template <typename T>
 void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
     if (ctx->cos_table == nullptr || n != 1 << ctx->stages) return;
     permute(re, im, n, ctx->bit_reverse);
+    const spectrum<T> x = {re, im};
     const double *w_re = ctx->cos_table;
     const double *w_im = ctx->sin_table;
     const auto size = static_cast<size_t>(n);
-    for (size_t half = 1; half < size; half *= 2) {
-        const size_t stride = size / 2 / half;
-        if (half < stride) {
-            for (size_t j = 0; j < half; ++j) {
-                const double j_re = w_re[j * stride];
-                const double j_im = w_im[j * stride];
-                for (size_t top = j; top < size; top += 2 * half) {
-                    butterfly(re, im, top, top + half, j_re, j_im);
-                }
-            }
-        } else {
-            for (size_t group = 0; group < size; group += 2 * half) {
-                for (size_t j = 0; j < half; ++j) {
-                    butterfly(re, im, group + j, group + j + half, w_re[j * stride],
-                              w_im[j * stride]);
-                }
+    size_t half = 1;  // elements from top to bottom in the first stage of a pass
+    if (ctx->stages % 2 != 0) {
+        for (size_t i = 0; i < size; i += 2) {
+            complex<T> a = load(x, i);
+            complex<T> b = load(x, i + 1);
+            butterfly(&a, &b, w_re[0], w_im[0]);
+            store(x, i, a);
+            store(x, i + 1, b);
+        }
+        half = 2;
+    }
+    for (; half < size; half *= 4) {
+        const size_t stride = size / (4 * half);  // of the second stage's twiddle factors
+        for (size_t j = 0; j < half; ++j) {
+            const complex<double> w0 = {w_re[2 * stride * j], w_im[2 * stride * j]};
+            const complex<double> w1 = {w_re[stride * j], w_im[stride * j]};
+            const complex<double> w2 = {w_re[stride * (j + half)], w_im[stride * (j + half)]};
+            for (size_t i = j; i < size; i += 4 * half) {
+                complex<T> a = load(x, i);
+                complex<T> b = load(x, i + half);
+                complex<T> c = load(x, i + 2 * half);
+                complex<T> d = load(x, i + 3 * half);
+                butterfly(&a, &b, w0.re, w0.im);
+                butterfly(&c, &d, w0.re, w0.im);
+                butterfly(&a, &c, w1.re, w1.im);
+                butterfly(&b, &d, w2.re, w2.im);
+                store(x, i, a);
+                store(x, i + half, b);
+                store(x, i + 2 * half, c);
+                store(x, i + 3 * half, d);
             }
         }
     }

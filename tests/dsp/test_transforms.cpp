@@ -4,6 +4,8 @@
 
 #include <cmath>
 #include <limits>
+#include <random>
+#include <utility>
 #include <vector>
 
 #include "dsp/dft.h"
@@ -18,7 +20,46 @@ using list = std::vector<double>;
 constexpr double kInf = std::numeric_limits<double>::infinity();
 constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
+// One stage after the other, one butterfly after the other.
+void transform_plainly(list &re, list &im, const TAVO_FFT_CTX &ctx) {
+    const size_t size = re.size();
+    for (size_t i = 0; i < size; ++i) {
+        if (ctx.bit_reverse[i] == 0) continue;
+        std::swap(re[i], re[ctx.bit_reverse[i]]);
+        std::swap(im[i], im[ctx.bit_reverse[i]]);
+    }
+    for (size_t half = 1; half < size; half *= 2) {
+        for (size_t top = 0; top < size; ++top) {
+            if ((top & half) != 0) continue;
+            const size_t bottom = top + half, k = top % half * (size / 2 / half);
+            const double w_re = ctx.cos_table[k], w_im = ctx.sin_table[k];
+            const double t_re = re[bottom] * w_re - im[bottom] * w_im;
+            const double t_im = re[bottom] * w_im + im[bottom] * w_re;
+            re[bottom] = re[top] - t_re;
+            im[bottom] = im[top] - t_im;
+            re[top] += t_re;
+            im[top] += t_im;
+        }
+    }
+}
+
 }  // namespace
+
+TEST(Fft, IsBitIdenticalToPlainStages) {
+    std::mt19937 random(1);
+    for (int16_t size = 2; size <= 8192; size = static_cast<int16_t>(size * 2)) {
+        TAVO_FFT_CTX ctx;
+        tavo_fft_init(size, &ctx);
+        list re(static_cast<size_t>(size)), im(re.size());
+        for (double &x : re) x = std::normal_distribution<double>()(random);
+        for (double &x : im) x = std::normal_distribution<double>()(random);
+        list plain_re = re, plain_im = im;
+        tavo_fft_proc(re.data(), im.data(), size, &ctx);
+        transform_plainly(plain_re, plain_im, ctx);
+        EXPECT_TRUE(re == plain_re && im == plain_im) << size;
+        tavo_fft_deinit(&ctx);
+    }
+}
 
 TEST(Fft, BitReverseTableListsEverySwapOnce) {
     TAVO_FFT_CTX ctx;
