@@ -9,7 +9,8 @@
 
 namespace {
 
-constexpr int64_t kMaxCopy = INT64_MAX / 32;  // values; two copies in bytes stay countable
+constexpr int64_t kMaxCopy =
+    INT64_MAX / 32;  // values; the byte size of two copies does not overflow
 
 // Two arrays of doubles in one allocation.
 struct complex_copy {
@@ -17,7 +18,7 @@ struct complex_copy {
     double *im;
 };
 
-// Allocates 2 count doubles. The first used values of re, and of im unless it is null, are copied;
+// Allocates count complex values. Copies the first used values of re, and of im unless it is null;
 // the rest is zero.
 bool copy_input(complex_copy *copy, const double *re, const double *im, int64_t used,
                 int64_t count) {
@@ -32,8 +33,9 @@ bool copy_input(complex_copy *copy, const double *re, const double *im, int64_t 
     return true;
 }
 
-// The fast transform spreads an infinite or NaN value over all outputs, which the sums do not, and
-// its intermediate values must not overflow: such input is summed term by term.
+// True if the fast transform is exact enough for the input. It would spread an infinite or NaN
+// value over all outputs, and its intermediate values could overflow; such input is summed term by
+// term.
 bool is_fit_for_fft(const complex_copy &x, int64_t used, int64_t n) {
     if (!is_fft_size(n)) return false;
     double l1_norm = 0.0;
@@ -51,7 +53,7 @@ bool transform_fast(double *re, double *im, int64_t n) {
     return true;
 }
 
-// Inputs from used on are zero and left out.
+// Skips the inputs from used on, which are zero.
 void forward_sums(double *re, double *im, int64_t n, const complex_copy &x, int64_t used,
                   bool real_input) {
     for (int64_t k = 0; k < n; ++k) {
@@ -129,7 +131,7 @@ int32_t tavo_inverse_dft(double *re, double *im, int64_t n, int64_t m, int32_t r
     const bool real = real_input != 0;
     complex_copy x;
     if (!copy_input(&x, re, real ? nullptr : im, n, n)) return TAVO_ERR_MEMORY;
-    // Exchanging real and imaginary part before and after turns the forward transform into the
+    // Swapping the real and imaginary parts before and after the forward transform gives the
     // inverse.
     if (is_fit_for_fft(x, n, n) && transform_fast(x.im, x.re, n)) {
         for (int64_t t = 0; t < outputs; ++t) {

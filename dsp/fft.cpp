@@ -6,9 +6,9 @@
 
 namespace {
 
-constexpr uint32_t kMaxReverseBits = 31;  // at 32 the mask would never empty
+constexpr uint32_t kMaxReverseBits = 31;  // bit_reverse2 returns 0 beyond it
 
-int32_t halvings(int32_t n) {
+int32_t count_halvings(int32_t n) {
     int32_t count = 0;
     for (; n > 1; n /= 2) ++count;
     return count;
@@ -74,8 +74,8 @@ inline void butterfly(complex<T> *top, complex<T> *bottom, double w_re, double w
     *top = {top->re + t.re, top->im + t.im};
 }
 
-// Radix 2, decimation in time. Each pass over the data runs two stages, on four elements at a time,
-// so that they stay in registers between the stages; of an odd number of stages, the first has a
+// Radix 2, decimation in time. Each pass over the data runs two stages on four elements at a time,
+// which stay in registers between the stages. If the number of stages is odd, the first one has a
 // pass of its own.
 template <typename T>
 void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
@@ -85,7 +85,7 @@ void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
     const double *w_re = ctx->cos_table;
     const double *w_im = ctx->sin_table;
     const auto size = static_cast<size_t>(n);
-    size_t half = 1;  // elements from top to bottom in the first stage of a pass
+    size_t half = 1;  // distance of the two inputs of a butterfly in the pass's first stage
     if (ctx->stages % 2 != 0) {
         for (size_t i = 0; i < size; i += 2) {
             complex<T> a = load(x, i);
@@ -126,7 +126,7 @@ void tavo_fft_init(int16_t n, TAVO_FFT_CTX *ctx) {
     *ctx = {};
     if (!is_fft_size(n)) return;
     const auto size = static_cast<size_t>(n);
-    ctx->stages = halvings(n);
+    ctx->stages = count_halvings(n);
     ctx->cos_table = static_cast<double *>(calloc(size, sizeof(double)));
     ctx->sin_table = static_cast<double *>(calloc(size, sizeof(double)));
     ctx->bit_reverse = static_cast<uint32_t *>(calloc(size, sizeof(uint32_t)));

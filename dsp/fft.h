@@ -1,5 +1,5 @@
-// The fast Fourier transform, unscaled, of double-precision data in separate real and imaginary
-// arrays. Callers: beat/onset_envelope.h, for every analysis frame; dsp/dft.h.
+// Fast Fourier transform of doubles, unscaled. Real and imaginary parts are in separate arrays.
+// Callers: beat/onset_envelope.h, for every analysis frame; dsp/dft.h.
 #ifndef TAVO_DSP_FFT_H
 #define TAVO_DSP_FFT_H
 
@@ -15,30 +15,30 @@ inline bool is_fft_size(int64_t n) {
     return n >= 2 && n <= kMaxFftSize && (n & (n - 1)) == 0;
 }
 
-// Tables for one size N, a power of two from 2 to 16384. Read-only after tavo_fft_init: one context
-// can be shared by many threads.
+// Tables for one size N, a power of two from 2 to 16384. tavo_fft_init fills them; afterwards they
+// are read-only, so threads may share one context.
 struct TAVO_FFT_CTX {
-    double *cos_table;      // [N] cos(2 pi k / N), the first N / 2 filled
-    double *sin_table;      // [N] -sin(2 pi k / N), the first N / 2 filled
-    uint32_t *bit_reverse;  // [N] the reversal of i where it is not below i, else 0
+    double *cos_table;      // [N] cos(2 pi k / N) in the first N / 2 entries
+    double *sin_table;      // [N] -sin(2 pi k / N) in the first N / 2 entries
+    uint32_t *bit_reverse;  // [N] the bit-reversed index where it is at least i, else 0
     int32_t stages;         // log2 N
 };
 static_assert(sizeof(void *) != 8 || offsetof(TAVO_FFT_CTX, stages) == 24);
 
 extern "C" {
 
-// Fills ctx, whatever it held before. If memory runs out, or n is not a power of two from 2 to
+// Fills ctx, which may be uninitialised. If memory runs out, or n is not a power of two from 2 to
 // 16384, all tables are null and stages is 0.
 void tavo_fft_init(int16_t n, TAVO_FFT_CTX *ctx);
 
-// Transforms re[n], im[n] in place; n as given to init. A context without tables changes nothing.
-// Returns re.
+// Transforms re[n], im[n] in place; n is the size given to tavo_fft_init. Does nothing if the
+// context has no tables. Returns re.
 double *tavo_fft_proc(double *re, double *im, int16_t n, const TAVO_FFT_CTX *ctx);
 
 // Releases the tables; a second call does nothing.
 void tavo_fft_deinit(TAVO_FFT_CTX *ctx);
 
-// x with its lowest bits bits (1 to 31) reversed; 0 for any other bits.
+// Returns x with its lowest bits bits reversed; 0 if bits is not 1 to 31.
 uint32_t bit_reverse2(uint32_t bits, uint32_t x);
 }
 

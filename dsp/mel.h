@@ -1,5 +1,5 @@
-// The mel scale: linear below 1000 Hz (15 mel), logarithmic above. Caller: beat/beat_ctx.h, which
-// places the edges of the mel bands.
+// The mel scale: linear up to 1000 Hz (15 mel), logarithmic above. Caller: beat/beat_ctx.h, for the
+// edges of the mel bands.
 #ifndef TAVO_DSP_MEL_H
 #define TAVO_DSP_MEL_H
 

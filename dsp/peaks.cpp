@@ -8,12 +8,12 @@
 
 namespace {
 
-// Marks of the input's positions while peaks are suppressed.
+// Marks on the input's positions.
 constexpr uint8_t kSuppressed = 1;
 constexpr uint8_t kPriority = 2;
 
 constexpr int64_t kMaxIndexed = INT32_MAX;  // positions that fit a 32-bit index
-constexpr int64_t kFar = INT64_MAX / 2;     // more than any radius
+constexpr int64_t kFar = INT64_MAX / 2;     // greater than any radius
 
 template <typename Sample>
 bool is_peak(const Sample *x, int64_t i) {
@@ -27,7 +27,7 @@ int64_t count_peaks(const Sample *x, int64_t len) {
     return count;
 }
 
-// Returns the count peaks of x[len] in ascending order, which the caller frees; null if memory runs
+// Returns the count peaks of x[len] in ascending order; the caller frees them. Null if memory runs
 // out.
 template <typename Record, typename Sample>
 Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
@@ -44,10 +44,9 @@ Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
     return peaks;
 }
 
-// Suppresses the positions at most radius away from index. Marking a peak that ranks before the one
-// at index changes nothing: had it survived, it would have suppressed that one, since the range is
-// symmetric. Survivors are more than radius apart, so all calls together mark each position at most
-// three times.
+// Suppresses the positions within radius of index. A larger peak in that range cannot have
+// survived, or it would have suppressed this one, so marking it again changes nothing. Survivors
+// are more than radius apart, so all calls together mark each position at most three times.
 void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius) {
     if (radius < 0) return;
     const int64_t begin = index > radius ? index - radius : 0;
@@ -55,7 +54,7 @@ void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius)
     memset(marks + begin, kSuppressed, static_cast<size_t>(end - begin + 1));
 }
 
-// Writes the surviving peaks, largest first, at most limit. Returns how many.
+// Writes the surviving peaks, largest first, limit at most. Returns how many it wrote.
 template <typename Record, typename Index>
 int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int64_t len,
                         int64_t radius, int64_t limit, Index *out) {
@@ -69,9 +68,9 @@ int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int6
     return written;
 }
 
-// Suppresses every position at most radius away from a priority position, in two sweeps.
+// Suppresses the positions within radius of any priority position, in two sweeps.
 void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t radius) {
-    int64_t distance = kFar;  // to the last priority position seen
+    int64_t distance = kFar;  // to the nearest priority position on the side already swept
     for (int64_t i = 0; i < len; ++i) {
         distance = (marks[i] & kPriority) != 0 ? 0 : distance + 1;
         if (distance <= radius) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
@@ -83,10 +82,10 @@ void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t radius) {
     }
 }
 
-// Returns what findNearestIndex does for strictly ascending positions and a target of at least 0,
-// by binary search: a long song has thousands of targets among hundreds of thousands of peaks.
+// findNearestIndex by binary search, for strictly ascending positions and a target of at least 0. A
+// long song has thousands of targets among hundreds of thousands of peaks.
 int32_t search_nearest(const int32_t *list, int32_t target, int32_t n) {
-    int32_t begin = 0;  // all entries before it are below target, none from end on is
+    int32_t begin = 0;  // entries before begin are below target, entries from end on are not
     int32_t end = n;
     while (begin < end) {
         const int32_t middle = begin + (end - begin) / 2;
@@ -101,8 +100,8 @@ int32_t search_nearest(const int32_t *list, int32_t target, int32_t n) {
     return list[begin] - target >= target - list[begin - 1] ? begin - 1 : begin;
 }
 
-// Writes the peaks nearest to the priority positions and marks them. Returns how many; -1 if memory
-// runs out.
+// Writes the peaks nearest to the priority positions and marks them. Returns how many it wrote; -1
+// if memory runs out.
 int32_t write_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *priority,
                          int32_t n_priority, uint8_t *marks, int32_t *out) {
     if (count < 2 || n_priority < 1) return 0;
@@ -112,7 +111,8 @@ int32_t write_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *p
     for (int32_t k = 0; k < count; ++k) list[k] = peaks[k].index;
     int32_t priorities = 0;
     for (int32_t k = 0; k < n_priority; ++k) {
-        // Distances to a target below 0 may wrap around, which only the linear walk reproduces.
+        // The distance to a target below 0 may wrap around, which only the linear search
+        // reproduces.
         const int32_t nearest = priority[k] < 0 ? findNearestIndex(list, priority[k], count)
                                                 : search_nearest(list, priority[k], count);
         if (nearest == count - 1) continue;
@@ -142,7 +142,8 @@ int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_
     if (peaks != nullptr && marks != nullptr) {
         qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO_F), compare_peak_f);
         const int64_t limit = max_count == 0 ? count : static_cast<int64_t>(max_count);
-        // Bounds included: at 0 the range holds the peak alone, and nothing is suppressed.
+        // The bounds are included. With a distance of 0 the range is the peak itself, so none is
+        // suppressed.
         written = write_survivors(peaks, count, marks, len, min_dist, limit, out);
     }
     free(marks);
@@ -161,7 +162,7 @@ int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out)
         if (min_dist != 0) {
             qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO), compare_peak);
         }
-        // Bounds excluded: a peak min_dist away survives.
+        // The bounds are excluded: a peak min_dist away survives.
         const auto radius = static_cast<int64_t>(min_dist) - 1;
         written = write_survivors(peaks, count, marks, len, radius, count, out);
     }

@@ -29,10 +29,10 @@ int compare_ivalue(const void *a, const void *b) {
 }
 
 void swap(void *a, void *b) {
-    char held[8];
-    memcpy(held, a, sizeof held);
-    memmove(a, b, sizeof held);
-    memcpy(b, held, sizeof held);
+    char copy[8];
+    memcpy(copy, a, sizeof copy);
+    memmove(a, b, sizeof copy);
+    memcpy(b, copy, sizeof copy);
 }
 
 int32_t partition(int32_t lo, int32_t hi, double *a) {
@@ -51,8 +51,8 @@ int32_t partition(int32_t lo, int32_t hi, double *a) {
     return static_cast<int32_t>(j);
 }
 
-// The two parts are independent: recursing into the smaller one bounds the depth by log2 of the
-// length and leaves the result as it is.
+// The two parts are independent. Recursing into the smaller one limits the depth to log2 of the
+// length; the result is the same.
 void quickSort(int32_t lo, int32_t hi, double *a) {
     while (lo < hi) {
         const int32_t middle = partition(lo, hi, a);

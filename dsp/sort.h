@@ -1,4 +1,4 @@
-// Comparators for qsort, none of which reports equality, and an in-place quicksort of doubles.
+// Comparators for qsort, which never report equality, and an in-place quicksort of doubles.
 // Callers: dsp/peaks.h, beat/power_rise.h (block levels).
 #ifndef TAVO_DSP_SORT_H
 #define TAVO_DSP_SORT_H
@@ -13,7 +13,7 @@ int compare_value(const void *a, const void *b);   // double, ascending
 int compare_fvalue(const void *a, const void *b);  // float, ascending
 int compare_ivalue(const void *a, const void *b);  // int32_t, ascending
 
-// Sorts a[lo .. hi], both included, ascending.
+// Sorts a[lo .. hi] ascending, both ends included.
 void quickSort(int32_t lo, int32_t hi, double *a);
 
 // Moves a[lo] to its sorted position among a[lo .. hi] and returns that position.

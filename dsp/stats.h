@@ -1,4 +1,4 @@
-// Mean and population standard deviation, in two passes in index order. NaN for n = 0. Callers:
+// Mean and population standard deviation in two passes, in index order. NaN if n is 0. Callers:
 // beat/onset_envelope.h (doubles), highlight/search.h (floats).
 #ifndef TAVO_DSP_STATS_H
 #define TAVO_DSP_STATS_H
@@ -8,7 +8,7 @@
 extern "C" {
 
 void getMeanStd(const double *x, int64_t n, double *mean, double *std);
-// Sums, divides and takes the root in single precision.
+// Computes sums, quotients and the square root in single precision.
 void getfloatMeanStd(const float *x, int64_t n, float *mean, float *std);
 }
 
