@@ -9,11 +9,10 @@
 
 extern "C" {
 
-// Returns the start in milliseconds and stores it in hl.hl_pos; 0 if there are less than 6 s of
-// PCM.
+// Returns the start in milliseconds and stores it in hl.hl_pos. 0 if the PCM is shorter than 6 s.
 uint32_t getHLPosition(TAVO_CTX *ctx);
 
-// Releases the envelope and the context itself; null does nothing.
+// Releases the loudness curve and the context itself. Null is ignored.
 void clearHighlgihtCtx(TAVO_HL_CTX *hl);
 }
 

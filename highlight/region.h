@@ -9,9 +9,9 @@
 
 extern "C" {
 
-// norm: [n] loudness, 0 to 1; mean, std: its population statistics. len_pts: requested length,
-// points. chosen: the coarse start. valleys: [15], the first nv used, ascending, the rest 0.
-// pairs: [2 nseg] start, end of each loud segment, ascending. Returns the start index.
+// norm: [n] loudness, 0 to 1; mean, std: its mean and population standard deviation. len_pts:
+// requested length in points. chosen: the coarse start. valleys: [15] the first nv ascending, the
+// rest 0. pairs: [2 nseg] start and end of each loud segment, ascending. Returns the start index.
 uint32_t tavo_select_highlight_region(const float *norm, int32_t n, int32_t len_pts, int32_t chosen,
                                       int32_t nv, const int32_t *valleys, const int32_t *pairs,
                                       int32_t nseg, float mean, float std);

@@ -14,26 +14,26 @@
 
 namespace {
 
-constexpr int32_t kMinPoints = 4;     // a song needs more after the skipped ones
-constexpr int32_t kMinSegment = 3;    // points of a loud segment
-constexpr int32_t kMinLoudAfter = 4;  // points that a segment lasts after an edge
-constexpr int32_t kNearValley = 3;    // an edge this close before a valley is ignored
+constexpr int32_t kMinPoints = 4;     // the curve must have more points after the skipped ones
+constexpr int32_t kMinSegment = 3;    // points in a loud segment
+constexpr int32_t kMinLoudAfter = 4;  // points that a segment must last after an edge
+constexpr int32_t kNearValley = 3;    // an edge within this many points before a valley is ignored
 constexpr int32_t kMaxSegments = 30;
 constexpr int32_t kMaxEdges = 10;
 constexpr uint32_t kEdgeDistance = 1;
 constexpr int32_t kPercentile = 60;
 constexpr double kMinSecondScore = 0.1;
 
-// The song's loudness curve and what the search finds on it. Unused entries of the lists are 0.
+// The loudness curve and what the search finds on it. Unused entries of the lists are 0.
 struct search_state {
-    const float *norm;  // [n] loudness over its largest value
-    const float *diff;  // [n - 1] steps of norm
+    const float *norm;  // [n] loudness divided by its largest value
+    const float *diff;  // [n - 1] differences of neighbouring points
     int32_t n;
     int32_t skip;
     int32_t tail;
     float mean;  // of norm
     float std;
-    float percentile;  // 60th, of norm
+    float percentile;  // 60th percentile of norm
     int32_t nseg;
     int32_t start[kMaxSegments];  // last point before the rise
     int32_t end[kMaxSegments];    // last point above the mean
@@ -47,14 +47,15 @@ uint32_t point_ms(int64_t k) {
     return static_cast<uint32_t>(static_cast<int64_t>(static_cast<float>(k + k) * 1000.0f));
 }
 
-// Ascending, NaNs last: a strict order for any content.
+// Ascending with NaNs last, a strict order for any values.
 bool is_less(float a, float b) {
     if (std::isnan(a) || std::isnan(b)) return !std::isnan(a);
     return a < b;
 }
 
-// Stores the largest value and the 60th percentile. Returns false if memory runs out. std::sort
-// allocates nothing; qsort out of memory needs a comparator that can report equality.
+// Finds the largest value and the 60th percentile. Returns false if memory runs out. std::sort
+// allocates nothing; qsort may allocate, and its fallback needs a comparator that can report
+// equality.
 bool rank_curve(const float *power, int32_t n, float *largest, float *percentile) {
     const auto count = static_cast<size_t>(n);
     auto *sorted = static_cast<float *>(note_shortage(malloc(count * sizeof(float))));
@@ -68,7 +69,8 @@ bool rank_curve(const float *power, int32_t n, float *largest, float *percentile
 }
 
 void find_segments(search_state *s) {
-    bool above = false;  // even if point 0 is: a song loud from the start opens a segment at 0
+    bool above =
+        false;  // even if point 0 is: a song that is loud from the start has a segment from 0 on
     for (int32_t k = 0; k < s->n - 1 && s->nseg < kMaxSegments; ++k) {
         const bool next_above = s->norm[k + 1] > s->mean;
         if (!above && next_above) s->start[s->nseg] = k;
@@ -84,7 +86,7 @@ void find_segments(search_state *s) {
     }
 }
 
-// Points from pos to the first valley after it; 0 if there is none.
+// Points from pos to the next valley; 0 if no valley follows.
 int32_t valley_distance(const search_state *s, int32_t pos) {
     for (int32_t k = 0; k < s->nv; ++k) {
         if (s->valley[k] > pos) return s->valley[k] - pos;
@@ -92,7 +94,7 @@ int32_t valley_distance(const search_state *s, int32_t pos) {
     return 0;
 }
 
-// True if pos is in a loud segment that lasts long enough after it.
+// True if pos is in a loud segment that lasts long enough after pos.
 bool is_in_segment(const search_state *s, int32_t pos) {
     if (pos > s->n - s->tail) return false;
     for (int32_t k = 0; k < s->nseg; ++k) {
@@ -101,7 +103,7 @@ bool is_in_segment(const search_state *s, int32_t pos) {
     return false;
 }
 
-// The edge with the best score; 0 if no edge has one.
+// The edge with the best score; 0 if no edge is scored.
 int32_t score_edges(const search_state *s) {
     float best = 0.0f;
     float second = 0.0f;
@@ -128,7 +130,7 @@ int32_t score_edges(const search_state *s) {
     return best_pos != 0 ? best_pos : second_pos;
 }
 
-// The first edge that leads to a loud point; the last edge if none does.
+// The first edge that leads to a loud point, or the last edge if none does.
 int32_t first_loud_edge(const search_state *s) {
     int32_t pos = 0;
     for (int32_t k = 0; k < s->edges; ++k) {
@@ -145,7 +147,7 @@ int32_t choose_edge(const search_state *s) {
     return scored != 0 ? scored : first_loud_edge(s);
 }
 
-// Start of the region if one of the requested length would exceed the song.
+// The region's start if a region of the requested length would extend past the end of the song.
 int32_t fallback_point(const search_state *s) {
     const int32_t start = s->nseg > 0 ? s->start[0] : 0;
     const int32_t valley = s->nv > 0 ? s->valley[0] : 0;
@@ -166,7 +168,7 @@ int64_t select_start(const search_state *s, int32_t chosen, int32_t hl_param) {
                                         s->nseg, s->mean, s->std);
 }
 
-// norm, diff: [n] scratch. Returns milliseconds.
+// Runs the search. norm, diff: [n] scratch. Returns milliseconds.
 uint32_t search_curve(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm, float *diff) {
     search_state s = {};
     s.norm = norm;

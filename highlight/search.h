@@ -7,7 +7,7 @@
 
 #include "common/tavo_ctx.h"
 
-// Curve points (2 s each) at the song's start and end where no rise is searched.
+// Limits of the search, in points of the curve (2 s each) unless a unit is given.
 constexpr int32_t kShortSongSeconds = 90;  // seconds; longer songs have the wider margins
 constexpr int32_t kSearchSkip = 9;   // first point where an edge is searched; 0 in a short song
 constexpr int32_t kSearchTail = 25;  // points before the end where no edge is scored
@@ -15,7 +15,7 @@ constexpr int32_t kShortSearchTail = 10;
 
 extern "C" {
 
-// duration_s: the song's length, whole seconds. Returns milliseconds; 0 if nothing is found.
+// duration_s: the song's length in whole seconds. Returns milliseconds, or 0 if nothing is found.
 uint32_t _get_HL_simple(TAVO_HL_CTX *hl, int32_t duration_s);
 }
 

@@ -1,4 +1,4 @@
-// Stage 7b, inside: the quiet stretches of the loudness curve. Called by highlight/search.h.
+// Stage 7b, inside: finds the quiet stretches of the loudness curve. Called by highlight/search.h.
 #ifndef TAVO_HIGHLIGHT_VALLEYS_H
 #define TAVO_HIGHLIGHT_VALLEYS_H
 
@@ -9,7 +9,8 @@ constexpr int32_t kMaxValleys = 15;
 extern "C" {
 
 // Finds the last point of each quiet stretch of values[n]. mean, std: of values; hop_s: seconds per
-// value. Writes at most kMaxValleys indexes to out, ascending, and nothing else. Returns how many.
+// value. Writes at most kMaxValleys ascending indexes to out and leaves its other entries
+// unchanged. Returns how many it wrote.
 int32_t tavo_find_valley(const float *values, int32_t n, int32_t *out, float mean, float std,
                          float hop_s);
 }
