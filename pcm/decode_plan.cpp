@@ -12,20 +12,21 @@ pthread_cond_t *ext_cond_mt = nullptr;
 
 namespace {
 
-constexpr int64_t kSingleThreadUnits = 50'000'000;  // up to 5 s one thread is enough
+constexpr int64_t kSingleThreadUnits =
+    50'000'000;  // a stream of up to 5 s is decoded by one thread
 constexpr int32_t kParallelSegments = 4;
-constexpr int64_t kOverlapUnits = 20'000'000;  // decoded beyond a segment's end, for the splice
+constexpr int64_t kOverlapUnits = 20'000'000;  // decoded past a segment's end, for the splice
 
 int32_t segments_for(int64_t units) {
     return units > kSingleThreadUnits ? kParallelSegments : 1;
 }
 
-// Records in the table. A later plan may use fewer of them than setup made.
+// Number of records in the table. A later plan may use fewer of them.
 int32_t table_size(const TAVO_CTX *ctx) {
     return std::max(ctx->seg_count, segments_for(ctx->duration));
 }
 
-// Reads format and duration from a source that is closed again.
+// Reads format and duration from a source that it opens and closes.
 int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     int32_t err = 0;
     mtsrc_ctx *probe = mtsrc_init(open_param, &err);
@@ -40,7 +41,8 @@ int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     return 0;
 }
 
-// Gives a segment of the current plan its length and a buffer, and moves its source to start.
+// Sets the length of a segment of the current plan, allocates its buffer and seeks its source to
+// start.
 int32_t plan_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_len) {
     TAVO_DECSEG *seg = &ctx->seg[index];
     const int32_t count = ctx->seg_count;
@@ -54,12 +56,12 @@ int32_t plan_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_le
     seg->buf = allocate_buffer(seg->cap);
     if (seg->buf == nullptr) return TAVO_ERR_MEMORY;
 
-    seg->seek_pos = start;  // kept when the seek fails without reporting a position
+    seg->seek_pos = start;  // stays if the seek fails without reporting a position
     mtsrc_seekstream(seg->src, start, &seg->seek_pos);
     return 0;
 }
 
-// Allocates the cleared PCM buffer for units of stream.
+// Allocates the zeroed PCM buffer for units (100 ns) of the stream.
 int32_t allocate_pcm(TAVO_CTX *ctx, int64_t units) {
     int64_t bytes = 0;
     if (!span_bytes(units, ctx->fmt.sample_rate, &bytes)) return TAVO_ERR_MEMORY;
@@ -71,7 +73,7 @@ int32_t allocate_pcm(TAVO_CTX *ctx, int64_t units) {
     return 0;
 }
 
-// The table of seg_count cleared records that share one array of done flags.
+// Allocates seg_count zeroed records with one shared array of done flags.
 int32_t allocate_table(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     ctx->seg = zeroed_items<TAVO_DECSEG>(ctx->seg_count);
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
@@ -90,7 +92,7 @@ int32_t allocate_table(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     return 0;
 }
 
-// All of the setup; what it made before a failure is left to tavo_decode_deinit.
+// Builds the whole plan. After a failure the caller releases what exists with tavo_decode_deinit.
 int32_t build_decoding(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     int32_t err = worker_lock_create(&ext_mutex_mt, &ext_cond_mt);
     if (err == 0) err = read_stream_format(ctx, open_param);
@@ -149,15 +151,15 @@ void tavo_decode_deinit(TAVO_CTX *ctx) {
 }
 
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start) {
-    // The caller has freed these. The pointers go before anything can fail, so that no release
-    // frees them again.
+    // The caller has freed these buffers. The pointers are cleared before anything can fail, so
+    // that no release frees them again.
     ctx->pcm = nullptr;
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
     for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].buf = nullptr;
 
     int64_t rest = 0;
     if (__builtin_sub_overflow(ctx->duration, start, &rest) || rest < 0) return TAVO_ERR_MEMORY;
-    // With a start below 0 the rest may ask for more segments than the table has records.
+    // If start is below 0, the rest may need more segments than the table has records.
     ctx->seg_count = std::min(segments_for(rest), table_size(ctx));
     const int64_t seg_len = rest / ctx->seg_count;
     int32_t err = 0;

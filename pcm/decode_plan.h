@@ -1,23 +1,23 @@
 // Stage 2a: plans the decoding.
 //
 // In: a path, or a start in the stream. Out: the segments, each with an open source and a buffer,
-// and a cleared buffer for the whole. Before: media_source/mtsrc.h. After: pcm/decode.h.
+// and a zeroed buffer for the whole. Before: media_source/mtsrc.h. After: pcm/decode.h.
 //
-// The stream is cut into 1 or 4 segments, each with a media source, a buffer and a thread of its
-// own. All but the last decode two seconds more than their length.
+// The stream is cut into 1 or 4 segments, each with its own media source, buffer and thread. All
+// but the last decode two seconds past their end.
 #ifndef TAVO_PCM_DECODE_PLAN_H
 #define TAVO_PCM_DECODE_PLAN_H
 
 #include "common/tavo_ctx.h"
 #include "media_source/mtsrc.h"
 
-// One decoding segment. A thread touches only its own record, buffer and source; done is shared and
-// guarded by the mutex.
+// One decoding segment. A thread uses only its own record, buffer and source, except for done,
+// which is shared and guarded by the mutex.
 struct TAVO_DECSEG {
-    int32_t index;  // from 0, also its slot in done
+    int32_t index;  // from 0, also its index in done
     pthread_t thread;
-    mtsrc_ctx *src;          // opened at setup, kept to the end, owned
-    mtsrc_param open_param;  // path: read only while setup runs
+    mtsrc_ctx *src;          // owned; stays open until the table is released
+    mtsrc_param open_param;  // path is read only during set-up
     TAVO_FMT fmt;
     int64_t duration;        // of the stream, 100-ns units
     uint8_t *buf;            // [cap] PCM bytes, owned
@@ -37,27 +37,28 @@ static_assert(sizeof(void *) != 8 ||
 
 extern "C" {
 
-// The decoding group's lock and condition, from tavo_decode_init to tavo_decode_deinit; else null.
+// Lock and condition of the decoding threads, from tavo_decode_init to tavo_decode_deinit;
+// otherwise null.
 extern pthread_mutex_t *ext_mutex_mt;
 extern pthread_cond_t *ext_cond_mt;
 
-// Plans the decoding of the file: fills fmt, duration, seg, seg_count, pcm, pcm_bytes.
-// Returns 0; TAVO_ERR_MEMORY; TAVO_ERR_FORMAT unusable, at most 1 s long or below 8000 Hz;
-// TAVO_ERR_HANDLE the file cannot be opened; or the code of a segment's source. On failure all
-// made here is released.
+// Plans the decoding of the file: fills fmt, duration, seg, seg_count, pcm, pcm_bytes. Returns 0;
+// TAVO_ERR_MEMORY; TAVO_ERR_FORMAT if the file is unusable, at most 1 s long or below 8000 Hz;
+// TAVO_ERR_HANDLE if it cannot be opened; or the code of a segment's source. On failure it releases
+// everything.
 int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param);
 
-// Releases the segment table with sources and buffers, the PCM buffer, the lock and the condition.
-// Safe on a partly built setup and when called twice.
+// Releases the segment table with its sources and buffers, the PCM buffer, the lock and the
+// condition. Accepts a partly built plan and may be called twice.
 void tavo_decode_deinit(TAVO_CTX *ctx);
 
-// Plans again for the stream from start (100-ns units) to its end, with the sources that are open,
-// and allocates new segment buffers and a new pcm. The caller has freed the old ones. Returns 0;
-// TAVO_ERR_MEMORY out of memory or nothing left, with the segment buffers freed.
+// Plans the decoding from start (100-ns units) to the end of the stream with the open sources, and
+// allocates new segment buffers and a new pcm. The caller must have freed the old ones. Returns 0;
+// TAVO_ERR_MEMORY if memory runs out or nothing is left to decode, with the segment buffers freed.
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
 }
 
-// Returns TAVO_OK if the stream can be analysed; else TAVO_ERR_SHORT, TAVO_ERR_LOW_RATE, or
+// Returns TAVO_OK if the stream can be analysed; otherwise TAVO_ERR_SHORT, TAVO_ERR_LOW_RATE, or
 // TAVO_ERR_FORMAT if its byte count overflows.
 int32_t check_stream(const mtsrc_format &format);
 

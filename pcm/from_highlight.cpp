@@ -11,40 +11,41 @@
 
 namespace {
 
-constexpr int64_t kFirstSeekMs = 1001;  // an earlier highlight is the beginning of the file
+constexpr int64_t kFirstSeekMs = 1001;  // an earlier highlight counts as the start of the file
 constexpr float kMsPerSecond = 1000.0f;
 
-// The probe is PCM decoded afresh from the seek position. Its block starts so late that a decoder
-// that has just been positioned delivers what it delivers in mid-stream.
+// The probe is PCM decoded from the seek position. Its block starts late enough for a decoder to
+// have settled after the seek.
 constexpr int64_t kProbeBytes = 8192;
 constexpr int64_t kProbeBlockOffset = 4608;
 
-// Seconds of PCM searched before and after the expected offset.
+// Seconds of PCM that are searched before and after the expected offset.
 constexpr int64_t kSecondsBefore = 1;
 constexpr int64_t kSecondsAfter = 3;
 
-constexpr int64_t kUnknownBytes = INT64_MAX;  // size of a PCM buffer that no record states
+constexpr int64_t kUnknownBytes = INT64_MAX;  // no record states the size of the PCM buffer
 
-// Offsets of the probe's block in PCM of pcm_bytes bytes, if the seek position is expected at byte
-// expected.
+// Range of offsets to test for the probe's block in PCM of pcm_bytes bytes. expected: the expected
+// byte offset of the seek position.
 offset_range search_range(int64_t expected, int32_t rate, int64_t pcm_bytes) {
     const int64_t second = std::max<int64_t>(second_bytes(rate), 0);
     const int64_t before = second * kSecondsBefore;
     const int64_t after = second * kSecondsAfter;
-    // The seek position must not be before the buffer. No sum here can overflow.
+    // The seek position must not be before the start of the buffer. None of these sums can
+    // overflow.
     const int64_t first =
         expected < before + kProbeBlockOffset ? kProbeBlockOffset : expected - before;
     const int64_t end = expected > pcm_bytes - after ? pcm_bytes : expected + after;
     return {first, std::min(end, pcm_bytes - kBlockBytes + 1)};
 }
 
-// Finds in pcm the audio that the source delivers next. *off: bytes, in the expected offset of that
-// audio, out the offset found. Returns 0 found, -1 not, with *off unchanged.
+// Finds in pcm the audio that the source delivers next. *off: its expected byte offset on entry,
+// the offset found on return. Returns 0 if found; -1 if not, with *off unchanged.
 int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_t pcm_bytes,
                         int64_t *off) {
     auto *probe = static_cast<uint8_t *>(malloc(kProbeBytes));
     if (probe == nullptr) {
-        mark_incomplete();  // a second decoding may give other beats
+        mark_incomplete();  // the second decoding may give other beats
         return -1;
     }
 
@@ -61,8 +62,7 @@ int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_
     return 0;
 }
 
-// Bytes of the buffer that the segment's plan allocated: from the segment's start to the end of the
-// stream.
+// Size in bytes of the buffer that was planned from the segment's start to the end of the stream.
 int64_t planned_bytes(const TAVO_DECSEG *seg) {
     if (seg->duration == 0) return kUnknownBytes;
     int64_t units = 0;
@@ -71,7 +71,7 @@ int64_t planned_bytes(const TAVO_DECSEG *seg) {
     return span_bytes(units, seg->fmt.sample_rate, &bytes) ? bytes : 0;
 }
 
-// Discards the decoding and decodes the stream again from start (100-ns units).
+// Discards the decoded PCM and decodes the stream again from start (100-ns units).
 int32_t decode_again(TAVO_CTX *ctx, int64_t start, segment_pages pages) {
     for (int32_t i = 0; i < ctx->seg_count; ++i) {
         free(ctx->seg[i].buf);
@@ -86,8 +86,8 @@ int32_t decode_again(TAVO_CTX *ctx, int64_t start, segment_pages pages) {
     return 0;
 }
 
-// Seeks to pos (milliseconds), stores the position reached as the highlight and finds it in the
-// decoded PCM, or decodes from there. *off: bytes of pcm before that position.
+// Seeks to pos (milliseconds) and stores the position reached as the highlight. Finds it in the
+// decoded PCM, or decodes again from there. *off: bytes of pcm before that position.
 int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t *off) {
     mtsrc_ctx *src = ctx->seg[0].src;
     const int32_t rate = ctx->fmt.sample_rate;
@@ -97,7 +97,7 @@ int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t 
     mtsrc_seekstream(src, reached, &reached);
     ctx->hl->hl_pos = static_cast<uint32_t>(reached / kUnitsPerMs);
 
-    // float on purpose, in this order: the expected offset is single precision
+    // Single precision on purpose, in this order: its rounding is part of the result.
     const float seconds = static_cast<float>(ctx->hl->hl_pos) / kMsPerSecond;
     *off = static_cast<int64_t>(seconds * 2.0f * static_cast<float>(rate));
     if (find_next_audio(src, rate, ctx->pcm, ctx->pcm_bytes, off) == 0) return 0;
@@ -106,12 +106,12 @@ int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t 
     return decode_again(ctx, reached, pages);
 }
 
-// Converts pcm without its first off bytes, and frees it.
+// Converts pcm without its first off bytes and frees it.
 int32_t convert_rest(TAVO_CTX *ctx, int64_t off) {
     int16_t *pcm = ctx->pcm;
     const int64_t bytes = pcm == nullptr ? 0 : std::max<int64_t>(ctx->pcm_bytes - off, 0);
     ctx->pcm = nullptr;
-    // To the front of the memory, where samples can be read whatever the offset.
+    // Moves the samples to the start of the buffer, because off may be odd.
     if (off > 0 && bytes > 0) {
         memmove(pcm, reinterpret_cast<const uint8_t *>(pcm) + off, static_cast<size_t>(bytes));
     }

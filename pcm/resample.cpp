@@ -9,9 +9,9 @@
 
 namespace {
 
-constexpr int64_t kTailBytes = 64;  // cleared, after the last output
+constexpr int64_t kTailBytes = 64;  // zero bytes after the last output
 
-// One conversion: count samples at a rate become n at another.
+// One conversion of count samples at source_rate to n samples at ana_rate.
 struct conversion {
     int64_t count;
     int64_t n;
@@ -21,7 +21,7 @@ struct conversion {
     float ratio;
 };
 
-// False for sizes or a source rate that give no length.
+// Returns false if the sizes or rates give no valid length.
 bool plan_conversion(int64_t bytes, int32_t source_rate, int32_t ana_rate, conversion *plan) {
     plan->count = std::max<int64_t>(bytes, 0) / kBytesPerSample;
     plan->source_rate = source_rate;
@@ -48,7 +48,7 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
     if (ready) {
         advise_huge_pages(narrow, plan.n * kBytesPerSample);
         if (dorn_resampler_prepare(state, plan.source_rate, plan.ana_rate, 1) == 0) {
-            // The converter counts its input in 32 bits. The rest, beyond 12 hours at 48 kHz,
+            // The converter counts its input in 32 bits. What is past them, 12 hours at 48 kHz,
             // stays 0.
             const auto in_len = static_cast<int32_t>(std::min<int64_t>(plan.count, INT32_MAX));
             convert_frames(state, in, in_len, narrow, plan.n);
@@ -60,16 +60,16 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
     return ready ? 0 : TAVO_ERR_MEMORY;
 }
 
-// True if out may be the memory of in: the interpolator has read all of its input before it writes
-// there, and four samples occupy the bytes of one output.
+// True if the output may overwrite the input. The interpolator has read all input before it writes,
+// and at ratio 4 the samples of one output take as many bytes as the output.
 bool works_in_place(const conversion &plan) {
     const int32_t whole = whole_ratio(plan.ratio);
     return plan.n > 0 && (whole == 0 || whole == kMaxWholeRatio);
 }
 
-// A heap block of at least the size of the output. It is *owned, enlarged and perhaps moved, if
-// that is not null and the conversion works in place; else it is new and cleared. Null if memory
-// runs out.
+// Returns a heap block large enough for the output. If *owned is not null and the conversion works
+// in place, this is *owned, which may be enlarged and moved; otherwise it is new and zeroed. Null
+// if memory runs out.
 double *allocate_output(const conversion &plan, int16_t **owned) {
     void *memory = nullptr;
     if (*owned != nullptr && works_in_place(plan)) {
@@ -84,14 +84,14 @@ double *allocate_output(const conversion &plan, int16_t **owned) {
     return static_cast<double *>(memory);
 }
 
-// Frees what the output does not need of its memory.
+// Frees the memory past the end of the output.
 double *shrink_output(const conversion &plan, double *out) {
     if (plan.size >= plan.count * kBytesPerSample) return out;
     void *smaller = realloc(out, static_cast<size_t>(plan.size));
     return smaller == nullptr ? out : static_cast<double *>(smaller);
 }
 
-// Converts pcm. owned: pcm, if it is to be freed and its memory may become the output's; else null.
+// Converts pcm. owned: pcm if this function frees it or reuses its memory; otherwise null.
 int32_t convert(const int16_t *pcm, int16_t *owned, int64_t bytes, int32_t source_rate,
                 int32_t ana_rate, int64_t *out_len, double **out) {
     *out_len = 0;

@@ -10,16 +10,16 @@
 
 extern "C" {
 
-// Converts bytes / 2 samples. On success *out is a new array of *out_len doubles (64 cleared bytes
-// follow them), the caller's to free. Returns 0; TAVO_ERR_MEMORY out of memory, or sizes or a
-// source rate that give no length, with *out null and *out_len 0. The interpolator ignores input
-// beyond 2^31 - 1 samples: its part of the output is 0.
+// Converts bytes / 2 samples. On success *out is a new array of *out_len doubles, followed by 64
+// zero bytes; the caller frees it. Returns 0; TAVO_ERR_MEMORY, with *out null and *out_len 0, if
+// memory runs out or the sizes and rates give no valid length. The interpolator ignores input past
+// 2^31 - 1 samples; its part of the output is 0.
 int32_t dorn_resampler_run(const int16_t *pcm, int64_t bytes, int32_t source_rate, int32_t ana_rate,
                            int64_t *out_len, double **out);
 }
 
-// The same, and frees pcm in any case. pcm comes from malloc, or is null; the output may be in its
-// memory.
+// dorn_resampler_run that also frees pcm, even on failure. pcm comes from malloc or is null. The
+// output may reuse its memory.
 int32_t convert_and_free(int16_t *pcm, int64_t bytes, int32_t source_rate, int32_t ana_rate,
                          int64_t *out_len, double **out);
 

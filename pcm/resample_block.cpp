@@ -13,16 +13,16 @@ pthread_cond_t *ext_cond_resample = nullptr;
 namespace {
 
 constexpr int32_t kParts = 4;
-constexpr int32_t kExactFloats = 1 << 24;  // whole numbers up to here are exact as floats
+constexpr int32_t kExactFloats = 1 << 24;  // floats represent whole numbers exactly up to here
 
-// Number of outputs, from 0 on, whose block has exactly whole samples. After them, positions in
-// single precision are rounded.
+// Number of outputs whose block has exactly whole samples. Later positions are rounded in single
+// precision.
 int64_t exact_blocks(int32_t whole) {
     return whole == 3 ? kExactFloats / 3 : kExactFloats;
 }
 
-// First input sample of output i, at most count. Single precision on purpose: the blocks of long
-// signals follow its rounding.
+// First input sample of output i, at most count. Single precision on purpose: its rounding
+// determines the blocks of long signals.
 int64_t block_start(float ratio, int64_t i, int64_t count) {
     const float position = ratio * static_cast<float>(i);
     const bool inside = static_cast<double>(position) < static_cast<double>(count);
@@ -35,8 +35,8 @@ double block_mean(const int16_t *in, int64_t first, int64_t end) {
     return static_cast<double>(sum / static_cast<float>(end - first));
 }
 
-// Outputs [first, end), whose blocks of the count samples have any length. in holds the samples
-// from base on.
+// Averages blocks of any length for the outputs first to end - 1. in[0] is sample base of the count
+// samples.
 void average_blocks(float ratio, const int16_t *in, int64_t base, int64_t count, double *out,
                     int64_t first, int64_t end) {
     for (int64_t i = first; i < end; ++i) {
@@ -44,14 +44,15 @@ void average_blocks(float ratio, const int16_t *in, int64_t base, int64_t count,
         const int64_t next = block_start(ratio, i + 1, count);
         if (begin < next) {
             out[i] = block_mean(in, begin - base, next - base);
-        } else {  // rounding left the block empty: the sample at its start, or the last one
+        } else {  // rounding left the block empty: use the sample at its start, or the last one
             out[i] = in[std::min(begin, count - 1) - base];
         }
     }
 }
 
-// Blocks of exactly kWhole samples. Sums of so few are exact in single precision, so integers give
-// the same. out may be the memory of in if kWhole is 4: a step is read before it is written.
+// Averages blocks of exactly kWhole samples. Their sums are exact in single precision, so integer
+// sums give the same result. If kWhole is 4, in and out may be the same memory, because each step
+// is read before it is written.
 template <int32_t kWhole>
 void average_whole(const int16_t *in, double *out, int64_t first, int64_t end) {
     constexpr int32_t kStep = 64;  // outputs
@@ -69,7 +70,7 @@ void average_whole(const int16_t *in, double *out, int64_t first, int64_t end) {
     }
 }
 
-// Blocks of four, four outputs side by side.
+// Averages blocks of four samples, four outputs side by side.
 void average_fours(const int16_t *in, double *out, int64_t first, int64_t end) {
     for (; first + 4 <= end; first += 4) {
         int_quad a;  // two samples in each lane
@@ -103,11 +104,11 @@ void average_part(void *record) {
     average_blocks(part->ratio, part->in, 0, part->in_count, part->out, exact, part->end);
 }
 
-// The outputs at ratio 4 from exact_blocks(4) to n, in the memory of in: blocks that begin before
-// their output are read ahead of it.
+// Computes the outputs from exact_blocks(4) to n at ratio 4 in place. A block may begin before the
+// place of its output, so it is read ahead.
 void average_rounded_in_place(const int16_t *in, int64_t count, double *out, int64_t n) {
-    // Outputs. The position of every kStep-th is exact in songs of up to 72 days, so that no block
-    // of a step extends further than one sample into the next.
+    // Outputs per step. The position of a step's first output is exact in songs of up to 72 days,
+    // so a block extends at most one sample into the next step.
     constexpr int64_t kStep = 4096;
     int16_t window[4 * kStep + 1];
     for (int64_t first = exact_blocks(4); first < n; first += kStep) {
@@ -172,7 +173,7 @@ bool average_on_threads(const int16_t *in, int64_t count, float ratio, double *o
 void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, double *out,
                        int64_t n, int32_t ana_rate) {
     if (source_rate < 1 || ana_rate < 1) return;
-    // A direct caller may not have made the lock that dorn_resampler_run makes.
+    // A direct caller may not have created the lock.
     const bool make_lock = ext_mutex_resample == nullptr;
     if (make_lock && worker_lock_create(&ext_mutex_resample, &ext_cond_resample) != 0) return;
     const float ratio = static_cast<float>(source_rate) / static_cast<float>(ana_rate);

@@ -11,16 +11,16 @@ constexpr double kPi = 3.141592653589793;
 constexpr int32_t kTapsWhole = 20;  // for a ratio within kWholeRatio of a whole number
 constexpr int32_t kTapsOther = 19;
 constexpr double kWholeRatio = 0.0001;
-constexpr double kEdgeDown = 0.9;             // cut-off as a part of the output's Nyquist frequency
-constexpr double kEdgeUp = 0.99;              // upper limit, as a part of the input's
-constexpr double kCentre = 1e-9;              // nearer to the sinc's centre, its limit is taken
-constexpr double kPhaseSteps = 960.0;         // phases per input sample
-constexpr double kMiddlePhase = 480.0;        // the phase without a fractional offset
-constexpr double kFracLimit = 0.500001;       // half a sample and some rounding
+constexpr double kEdgeDown = 0.9;        // cut-off relative to the output's Nyquist frequency
+constexpr double kEdgeUp = 0.99;         // upper limit relative to the input's Nyquist frequency
+constexpr double kCentre = 1e-9;         // closer to its centre the sinc is replaced by its limit
+constexpr double kPhaseSteps = 960.0;    // phases per input sample
+constexpr double kMiddlePhase = 480.0;   // the phase with no fractional offset
+constexpr double kFracLimit = 0.500001;  // half a sample plus rounding
 constexpr float kRatioLimit = 2147483648.0f;  // no pair of rates reaches it
 
-// Coefficient of tap k for the fractional offset f, cut-off wc. Which steps are single precision
-// and which double is part of the result.
+// Coefficient of tap k for the fractional offset f and the cut-off wc. The mix of single and double
+// precision is part of the result.
 float tap_coefficient(int32_t taps, int32_t k, float f, float wc) {
     const auto span = static_cast<float>(taps);
     const float t = std::clamp(static_cast<float>(k) - f, 0.0f, span);
@@ -36,7 +36,7 @@ float tap_coefficient(int32_t taps, int32_t k, float f, float wc) {
     return static_cast<float>(sinc * static_cast<double>(w));
 }
 
-// The input of one output frame: frames first to first + taps, weighted by row.
+// Input of one output frame: input frames first to first + taps, weighted by row.
 struct frame_input {
     int64_t first;
     const float *row;
@@ -62,7 +62,7 @@ status find_input(const dorn_resampler_state &state, int64_t j, int32_t in_len,
     return status::inside;
 }
 
-// One frame. Samples outside the input count as 0.
+// Computes one output frame. Samples outside the input count as 0.
 void filter_frame(const dorn_resampler_state &state, const frame_input &input, const int16_t *in,
                   int32_t in_len, int16_t *out) {
     for (int32_t c = 0; c < state.channels; ++c) {
@@ -100,7 +100,7 @@ int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int
     status found = status::inside;
     int64_t j = 0;
     while (j < max_frames) {
-        // Near the ends, and with several channels, frame by frame.
+        // Near the ends, and with several channels, output frames are computed one by one.
         if (channels == 1 && j + kQuad <= max_frames &&
             filter_quad(*state, j, in, in_len, out + j)) {
             j += kQuad;

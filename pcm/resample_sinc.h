@@ -1,4 +1,4 @@
-// Stage 3, all other ratios: a windowed-sinc interpolator with 961 phases.
+// Stage 3 for all other ratios: a windowed-sinc interpolator with 961 phases.
 //
 // In: 16-bit PCM, interleaved. Out: 16-bit PCM at the target rate. Called by pcm/resample.cpp.
 #ifndef TAVO_PCM_RESAMPLE_SINC_H
@@ -13,31 +13,31 @@ constexpr int32_t kResampleRow = 25;      // capacity for the taps + 1 coefficie
 struct dorn_resampler_state {
     int32_t taps;      // N: 20 for a ratio within 0.0001 of a whole number, else 19
     float ratio;       // source rate / target rate
-    int32_t channels;  // interleaved, in and out
-    float coef[kResamplePhases][kResampleRow];  // the first taps + 1 of a row used
+    int32_t channels;  // of input and output, interleaved
+    float coef[kResamplePhases][kResampleRow];  // each row uses its first taps + 1 entries
 };
 
 static_assert(offsetof(dorn_resampler_state, coef) == 12);
 
 extern "C" {
 
-// Fills a cleared state. Returns 0; -1 if the target rate is not positive or the source rate is 0.
-// A source rate below 0 gives a useless table: the conversion refuses it.
+// Fills a zeroed state. Returns 0; -1 if the target rate is not positive or the source rate is 0.
+// With a negative source rate it fills a table that the conversion rejects.
 int32_t dorn_resampler_prepare(dorn_resampler_state *state, int32_t source_rate,
                                int32_t target_rate, int32_t channels);
 
-// Converts in_len samples (all channels together). Returns the samples written to out, 0 if the
-// input is too short for one; -1 for a missing argument or a phase out of range.
+// Converts in_len samples of all channels together. Returns the samples written to out, 0 if the
+// input is too short for one; -1 if an argument is missing or a phase is out of range.
 int32_t dorn_resampler_convert(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
                                int16_t *out);
 }
 
-// dorn_resampler_convert that stops after max_frames frames. On long inputs the single-precision
-// position lags so far that the conversion gives more frames than the rates say.
+// dorn_resampler_convert limited to max_frames output frames. On long inputs the single-precision
+// position lags so far that the conversion would write more than the rates allow.
 int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
                        int16_t *out, int64_t max_frames);
 
-// The low 16 bits of the sum rounded to the nearest integer, halves up. A larger sum wraps.
+// The sum rounded to the nearest integer, halves up, in its low 16 bits.
 int16_t wrap_sample(float sum);
 
 #endif

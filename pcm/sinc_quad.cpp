@@ -4,9 +4,9 @@
 
 namespace {
 
-constexpr float kSmallFloat = 1073741824.0f;  // 2^30: a little more still fits an int32_t
+constexpr float kSmallFloat = 1073741824.0f;  // 2^30: rounding it up still fits an int32_t
 
-// Four taps of one frame: its samples as floats, weighted.
+// Converts four taps of one output frame to floats and weights them.
 float_quad weigh_taps(const float *row, const int16_t *in) {
     int64_t four = 0;
     memcpy(&four, in, sizeof four);
@@ -18,18 +18,18 @@ float_quad weigh_taps(const float *row, const int16_t *in) {
     return weights * __builtin_convertvector(samples, float_quad);
 }
 
-// True if a lane of a comparison's result is set.
+// True if any lane of a comparison's result is set.
 bool any_lane(int_quad mask) {
     const auto halves = reinterpret_cast<int64_pair>(mask);
     return (halves[0] | halves[1]) != 0;
 }
 
-// wrap_sample of four sums. False, with nothing written, if one of them is too large.
+// wrap_sample of four sums. Returns false and writes nothing if any of them is too large.
 bool wrap_quad(float_quad acc, int16_t *out) {
     if (any_lane(~((acc > -kSmallFloat) & (acc < kSmallFloat)))) return false;
     int_quad rounded = __builtin_convertvector(acc, int_quad);
     const float_quad rest = acc - __builtin_convertvector(rounded, float_quad);
-    rounded += (rest < -0.5f) - (rest >= 0.5f);  // a comparison that holds is -1
+    rounded += (rest < -0.5f) - (rest >= 0.5f);  // a true comparison is -1
     const auto halves = reinterpret_cast<int16_octet>(rounded);
     const auto low = reinterpret_cast<int64_pair>(
         __builtin_shufflevector(halves, halves, 0, 2, 4, 6, 0, 2, 4, 6));
@@ -72,8 +72,9 @@ float_quad sum_quad(int32_t taps, const float *const *row, const int16_t *const 
     return acc;
 }
 
-// Finds the first input sample and the phase of the frames from j on, as find_input does for one
-// frame. False if a frame is not wholly inside the input or its phase may be out of range.
+// Finds the first input sample and the phase of the output frames from j on, as find_input does for
+// one. Returns false if an output frame needs samples outside the input or its phase may be out of
+// range.
 bool find_inputs(const dorn_resampler_state &state, int64_t j, int32_t in_len, int_quad *first,
                  int_quad *phase) {
     const float last = state.ratio * static_cast<float>(j + kQuad - 1);
@@ -84,14 +85,14 @@ bool find_inputs(const dorn_resampler_state &state, int64_t j, int32_t in_len, i
     const int_quad base = __builtin_convertvector(pos, int_quad);
     const float_quad whole = __builtin_convertvector(base, float_quad);
 
-    // Positions ascend: the first and the last decide for all.
+    // Positions ascend, so checking the first and the last is enough.
     const float half = static_cast<float>(state.taps) / 2.0f;
     *first = base - static_cast<int32_t>(half);
     if ((*first)[0] < 1 || (*first)[3] + state.taps >= in_len) return false;
     if (static_cast<double>(half + whole[3]) >= static_cast<double>(in_len)) return false;
 
-    // Positions of 1 and more have at most 23 fractional bits, so the differences are exact, and
-    // so is floor(960 * frac + 480.5) in units of 2^-17.
+    // Positions of 1 and more have at most 23 fractional bits. The differences are therefore exact,
+    // and so is floor(960 * frac + 480.5) in units of 2^-17.
     const float_quad frac = pos - whole - (state.taps % 2 != 0 ? 0.5f : 0.0f);
     if (any_lane(frac > 0.5f)) return false;
     const int_quad bits = __builtin_convertvector(frac * 8388608.0f, int_quad);

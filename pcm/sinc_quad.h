@@ -8,8 +8,8 @@
 
 constexpr int32_t kQuad = 4;
 
-// Computes frames j to j + 3 into out[4]. Returns false, with nothing written, if the input of one
-// of them is not wholly inside in[in_len] or its phase may be out of range.
+// Computes output frames j to j + 3 into out[4]. Returns false and writes nothing if the input of
+// any of them extends past in[in_len] or its phase may be out of range.
 bool filter_quad(const dorn_resampler_state &state, int64_t j, const int16_t *in, int32_t in_len,
                  int16_t *out);
 

@@ -10,23 +10,24 @@
 
 extern "C" {
 
-// dst[i] = (left + right) / 2 of frame i of interleaved stereo src, toward zero. For direct use.
+// dst[i] = (left + right) / 2 of sample frame i of interleaved stereo, rounded toward zero. For
+// direct calls only.
 void stereo2mono(int16_t *dst, const int16_t *src, int32_t frames);
 }
 
-// A segment's buffer stays allocated once it is stitched. kept: with its bytes. released: the pages
-// of a large buffer go back to the system, and it reads as zeros.
+// What happens to a segment's buffer once it is stitched. It stays allocated in any case. kept:
+// unchanged. released: the pages of a large buffer go back to the system, and it reads as zeros.
 enum class segment_pages { kept, released };
 
-// One second of PCM, bytes. Every segment but the first drops it, because a decoder that has just
-// been positioned may not yet deliver what it delivers in mid-stream.
+// Bytes of one second of PCM. Every segment but the first drops its first second, because a decoder
+// may need that long to settle after a seek.
 inline int64_t second_bytes(int32_t rate) {
     return rate * kBytesPerSample;
 }
 
-// Copies the count decoded segments to dst (capacity bytes), each to where the output already
-// holds the same bytes, or to its end. Returns the bytes written, 0 if a segment has nothing to
-// give.
+// Copies the count decoded segments to dst (capacity bytes). Each goes to where the output already
+// holds the same bytes, or to the end of the output. Returns the bytes written; 0 if any segment is
+// empty.
 int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
                         int64_t capacity, segment_pages pages);
 
