@@ -9,7 +9,7 @@ pthread_cond_t *feat_cond_mt = nullptr;
 
 namespace {
 
-// Number of whole frames, one per hop. The division truncates toward zero, so that a signal a
+// Number of whole analysis frames, one per hop. The division truncates toward zero, so a signal a
 // little shorter than a frame counts as one; that frame is never read.
 int64_t count_frames(int64_t samples, int32_t frame_size, int32_t hop_size) {
     if (frame_size < 1 || hop_size < 1) return 0;
@@ -36,10 +36,11 @@ void release(T **items) {
     *items = nullptr;
 }
 
-// Upper edge of the triangle below band k; single precision in every step.
+// Lower edge of band k, which is also the centre of the band before. Every step is single
+// precision.
 float band_edge(float top_mel, uint64_t k, uint32_t nbands) {
-    const float share = static_cast<float>(k) / static_cast<float>(uint64_t{nbands} + 1);
-    return Mel2Hz(top_mel * share + 0.0f);
+    const float fraction = static_cast<float>(k) / static_cast<float>(uint64_t{nbands} + 1);
+    return Mel2Hz(top_mel * fraction + 0.0f);
 }
 
 }  // namespace

@@ -1,6 +1,7 @@
-// Stage 4, set-up: the working context of one beat analysis and the feature group's lock.
+// Stage 4, set-up: the context of one beat analysis, and the lock of its worker groups.
 //
-// In: TAVO_CTX with ana, ana_len, ana_rate and onset. Lives for one call of getBeatPosition.
+// In: TAVO_CTX with ana, ana_len, ana_rate and onset. The context lives for one call of
+// getBeatPosition.
 #ifndef TAVO_BEAT_BEAT_CTX_H
 #define TAVO_BEAT_BEAT_CTX_H
 
@@ -15,14 +16,14 @@
 constexpr int32_t kMelBands = 36;
 constexpr int32_t kBeatWorkers = 4;
 
-// F = frame_count, n = samples of the analysis signal, N = frame size.
+// F = frame_count, n = samples of the analysis signal, N = samples of an analysis frame.
 struct TAVO_BEAT_CTX {
-    double *onset_env;     // [F] spectral flux per frame; the last entry stays 0
+    double *onset_env;     // [F] spectral flux per analysis frame; the last entry stays 0
     float **mel_matrix;    // [N / 2] rows, one per FFT bin, of [36] band weights
     float *frame_times;    // [F] seconds, (k + 1) hops
     double *signal;        // [n] ana / 32767
-    double *threshold;     // [F] copy of the threshold curve, its F - 1 values
-    int32_t *rise_frames;  // [rise_count] frames of the power rises, or null
+    double *threshold;     // [F] the threshold curve; the last entry stays 0
+    int32_t *rise_frames;  // [rise_count] analysis frames of the power rises; may be null
     int32_t rise_count;
     int32_t *rise_flags;  // [n] 1 at the sample where a power rise starts
     int32_t half_frame;   // N / 2
@@ -34,8 +35,8 @@ struct TAVO_BEAT_CTX {
 static_assert(sizeof(void *) != 8 || (offsetof(TAVO_BEAT_CTX, rise_flags) == 56 &&
                                       offsetof(TAVO_BEAT_CTX, band_count) == 88));
 
-// Samples of the analysis signal. Divided by full_scale they are between -1 and 1: 32767 for an
-// instance's ana, 1 for TAVO_BEAT_CTX.signal.
+// Samples of the analysis signal. samples[i] / full_scale is between -1 and 1. full_scale is 32767
+// for an instance's ana and 1 for TAVO_BEAT_CTX.signal.
 struct sample_view {
     const double *samples;
     double full_scale;
@@ -45,29 +46,30 @@ constexpr double kFullScale = 32767.0;  // of ana
 
 extern "C" {
 
-// Used by both worker groups of this folder, from __beat_init to __tavo_deinit; otherwise null.
+// Shared by both worker groups of this folder, from __beat_init to __tavo_deinit; otherwise null.
 extern pthread_mutex_t *feat_mutex_mt;
 extern pthread_cond_t *feat_cond_mt;
 
-// Fills a zeroed context from the instance. If memory runs out it stays partly filled.
+// Fills a zeroed context from the instance. If memory runs out, some of its fields stay null.
 void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
 
-// Releases what the context owns, the lock and the condition; not the record itself.
+// Releases what the context owns, the lock and the condition, but not the record itself.
 void __tavo_deinit(TAVO_BEAT_CTX *beat);
 
-// Weights of nbands triangles of unit area, equally spaced on the mel scale from 0 to fmax Hz, for
-// the bins 0 .. nfft / 2 - 1: matrix[bin][band].
+// Fills matrix[bin][band] with the weights of nbands triangles for the bins 0 .. nfft / 2 - 1. The
+// triangles have unit area and are equally spaced on the mel scale from 0 to fmax Hz.
 void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float **matrix);
 }
 
-// Divides the samples of view by its full scale: scaled[count].
+// Divides the first count samples of view by its full scale.
 void scale_samples(sample_view view, int64_t count, double *scaled);
 
-// The body of __beat_init. A job, which reads ana itself, sets with_signal to false: signal and
-// rise_flags, 12 bytes a sample, then stay null. Returns false if memory ran out for the rest.
+// The body of __beat_init. Jobs read ana directly and set with_signal to false: signal and
+// rise_flags, 12 bytes per sample, then stay null. Returns false if memory runs out for any other
+// field.
 bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat);
 
-// Length of the analysis signal in samples, 0 if there is none.
+// Length of the analysis signal in samples; 0 if ana is null.
 inline int64_t analysis_length(const TAVO_CTX *ctx) {
     return ctx->ana != nullptr && ctx->ana_len > 0 ? ctx->ana_len : 0;
 }

@@ -17,7 +17,7 @@ outcome check_stop(const TAVO_CTX *ctx) {
     return load_flag(&ctx->quit) != 0 ? stopped : going_on;
 }
 
-// The search for power rises, which runs while the onset envelope is computed.
+// Arguments and result of the search for power rises, which runs side the onset envelope.
 struct rise_search {
     const TAVO_CTX *ctx;
     int32_t count;     // or TAVO_ERR_MEMORY
@@ -49,8 +49,8 @@ outcome store_rises(const rise_search *search, int32_t hop_size, TAVO_BEAT_CTX *
 outcome find_onsets_and_rises(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     const TAVO_ONSET_CTX *onset = ctx->onset;
     rise_search search = {ctx, 0, nullptr};
-    const side_work beside = {search_rises, &search};
-    compute_onset_envelope(beat, view_of(ctx), onset->frame_size, onset->hop_size, &beside);
+    const side_work side = {search_rises, &search};
+    compute_onset_envelope(beat, view_of(ctx), onset->frame_size, onset->hop_size, &side);
     const outcome end = store_rises(&search, onset->hop_size, beat);
     free(search.samples);
     return end;
@@ -63,7 +63,7 @@ outcome find_tempo(TAVO_ONSET_CTX *onset, const TAVO_BEAT_CTX *beat) {
     return going_on;
 }
 
-// Stores the beats in an array of their exact number; without beats it stays null.
+// Stores the beats in an array of exactly their number. Without beats the array stays null.
 outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
     auto *times = zeroed_items<float>(candidate_capacity(beat));
     if (times == nullptr) return out_of_memory;
@@ -92,7 +92,7 @@ outcome analyse(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     return end;
 }
 
-// Releases the beats of an earlier analysis of the same instance.
+// Releases the beats of an earlier analysis by the same instance.
 void release_beats(TAVO_ONSET_CTX *onset) {
     free(onset->beat_times);
     onset->beat_times = nullptr;

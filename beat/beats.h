@@ -9,11 +9,11 @@
 
 extern "C" {
 
-// Returns the number of beats and sets the state to finished. A stop request, checked before the
-// onset envelope and after the tempo, ends it with 0 beats and the state as it was.
+// Returns the number of beats and sets the state to finished. A stop request is checked before the
+// onset envelope and after the tempo; it returns 0 and leaves the state unchanged.
 int32_t getBeatPosition(TAVO_CTX *ctx);
 
-// Releases the beats and the record itself; null does nothing.
+// Releases the beats and the record itself. Null is ignored.
 void clearOnsetCtx(TAVO_ONSET_CTX *onset);
 }
 

@@ -8,26 +8,26 @@
 
 namespace {
 
-constexpr double kMinute = 60.0;         // seconds: tempo to period
-constexpr int32_t kSlowBpm = 95;         // up to here beats are at least kSlowSpan apart
+constexpr double kMinute = 60.0;         // seconds
+constexpr int32_t kSlowBpm = 95;         // up to this tempo beats are at least kSlowSpan apart
 constexpr float kSlowSpan = 3.0f;        // seconds
 constexpr float kFastSpan = 1.0f;        // seconds
-constexpr int32_t kBeatPerFrame = 2583;  // BPM of one beat a frame, the fastest
+constexpr int32_t kBeatPerFrame = 2583;  // the fastest tempo: one beat per analysis frame
 constexpr double kWindowBeats = 4.0;     // beat periods in the threshold's window
 constexpr float kMsPerSecond = 1000.0f;
 
-// Distances of beats at one tempo.
+// Distances between beats at one tempo.
 struct spacing {
-    float span;        // seconds: a whole number of periods, the least distance of two beats
-    int32_t distance;  // the same in frames
-    int32_t window;    // frames in the threshold's window, even
+    float span;  // seconds: a whole number of beat periods, the smallest distance of two beats
+    int32_t distance;  // span in analysis frames
+    int32_t window;    // analysis frames in the threshold's window, even
 };
 
 spacing spacing_at(int32_t bpm, float hop) {
     const double period = kMinute / bpm;
     const float least = bpm <= kSlowBpm ? kSlowSpan : kFastSpan;
     spacing beats = {};
-    // float on purpose: the sum runs in single precision
+    // Single precision on purpose: its rounding is part of the result.
     while (beats.span < least) beats.span += static_cast<float>(period);
     beats.distance = static_cast<int32_t>(beats.span / hop);
 
@@ -37,7 +37,7 @@ spacing spacing_at(int32_t bpm, float hop) {
     return beats;
 }
 
-// Peaks near a power rise come first and need no threshold. Returns how many were accepted.
+// Peaks near a power rise come first and need not exceed the threshold. Returns how many it wrote.
 int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const double *thr,
                      int32_t max_beats, float *out) {
     int32_t accepted = 0;
@@ -50,9 +50,9 @@ int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const do
     return accepted;
 }
 
-// thr: [F - 1] zero before; peaks: zero before.
-int32_t place_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *thr, PEAK_LIST *peaks,
-                    float *out) {
+// Writes the beat times to out. thr: [F - 1] zeroed; peaks: zeroed. Returns their number.
+int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *thr,
+                      PEAK_LIST *peaks, float *out) {
     const int64_t count = beat->frame_count > 1 ? beat->frame_count - 1 : 0;
     const float hop =
         beat->frame_count > 0 ? beat->frame_times[0] : static_cast<float>(beat->hop_seconds);
@@ -64,8 +64,8 @@ int32_t place_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *th
     peaks->count = found > 0 ? found : 0;
     std::copy(thr, thr + count, beat->threshold);
 
-    // std::sort allocates nothing. qsort out of memory runs out of bounds with a comparator that
-    // never reports equality.
+    // std::sort allocates nothing. qsort may allocate, and if memory runs out it falls back to an
+    // algorithm that reads out of bounds with comparators that never report equality.
     const int32_t accepted = select_beats(beat, peaks, thr, onset->max_beats, out);
     std::sort(peaks->frames, peaks->frames + peaks->count);
     std::sort(out, out + accepted);
@@ -75,7 +75,7 @@ int32_t place_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *th
     return total;
 }
 
-// No two peaks are neighbours.
+// The capacity for peaks: no two of them are neighbours.
 int64_t peak_capacity(const TAVO_BEAT_CTX *beat) {
     return (beat->frame_count > 0 ? beat->frame_count / 2 : 0) + beat->rise_count;
 }
@@ -92,7 +92,7 @@ int32_t getBeatCandi_MT(TAVO_BEAT_CTX *beat, TAVO_ONSET_CTX *onset, float *out) 
     PEAK_LIST peaks = {zeroed_items<int32_t>(peak_capacity(beat)), 0};
     int32_t total = 0;
     if (thr != nullptr && peaks.frames != nullptr) {
-        total = place_beats(beat, onset, thr, &peaks, out);
+        total = compute_beats(beat, onset, thr, &peaks, out);
     }
     free(thr);
     free(peaks.frames);

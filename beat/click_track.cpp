@@ -15,41 +15,41 @@ constexpr size_t kHeaderBytes = 44;
 constexpr uint32_t kFileRate = kAnalysisRate;  // Hz
 constexpr uint32_t kFileSampleBytes = 2;
 constexpr double kBlipHz = 4000.0;
-constexpr double kBlipScale = 160.0;  // scales the blip's peak to about a quarter
+constexpr double kBlipScale = 160.0;  // brings the blip's peak to about a quarter
 constexpr float kBlipSeconds = 0.1f;
 constexpr double kBlipGain = 2.5;
-constexpr int32_t kChunk = 2048;  // samples written at once
+constexpr int32_t kChunk = 2048;  // samples per write
 
-void put_u16(uint8_t *to, uint32_t value) {
-    to[0] = static_cast<uint8_t>(value & 0xFF);
-    to[1] = static_cast<uint8_t>(value >> 8 & 0xFF);
+void put_u16(uint8_t *dst, uint32_t value) {
+    dst[0] = static_cast<uint8_t>(value & 0xFF);
+    dst[1] = static_cast<uint8_t>(value >> 8 & 0xFF);
 }
 
-void put_u32(uint8_t *to, uint32_t value) {
-    put_u16(to, value & 0xFFFF);
-    put_u16(to + 2, value >> 16);
+void put_u32(uint8_t *dst, uint32_t value) {
+    put_u16(dst, value & 0xFFFF);
+    put_u16(dst + 2, value >> 16);
 }
 
-void put_tag(uint8_t *to, const char *tag) {
-    for (int32_t i = 0; i < 4; ++i) to[i] = static_cast<uint8_t>(tag[i]);
+void put_tag(uint8_t *dst, const char *tag) {
+    for (int32_t i = 0; i < 4; ++i) dst[i] = static_cast<uint8_t>(tag[i]);
 }
 
 int32_t blip_length(int32_t sr) {
     return sr > 0 ? static_cast<int32_t>(static_cast<float>(sr) * kBlipSeconds) : 0;
 }
 
-// A 4 kHz tone that swells for a tenth of the length and fades.
+// A 4 kHz tone that swells for a tenth of its length and then fades.
 void make_blip(int32_t sr, int32_t length, float *blip) {
     const int32_t tenth = length / 10;
     const auto tau = static_cast<float>(tenth);
     for (int32_t i = 0; i < length; ++i) {
-        const float decay = -static_cast<float>(i) / tau;  // float on purpose
+        const float decay = -static_cast<float>(i) / tau;  // single precision on purpose
         const double envelope = exp(static_cast<double>(decay)) * i;
         blip[i] = static_cast<float>(envelope * cos(i * kTwoPi / sr * kBlipHz) / kBlipScale);
     }
 }
 
-// Index of the sample nearest to a beat; n for a beat past the n samples, -1 for one before them.
+// Index of the sample nearest to a beat. n for a beat past the end, -1 for one before the start.
 int64_t beat_sample(float beat, int32_t sr, int64_t n) {
     const float samples = beat * static_cast<float>(sr) / 1000.0f;
     const double nearest = static_cast<double>(samples) + 0.5;
@@ -57,7 +57,7 @@ int64_t beat_sample(float beat, int32_t sr, int64_t n) {
     return nearest < static_cast<double>(n) ? static_cast<int64_t>(nearest) : n;
 }
 
-// A blip truncated at the end of the track stops one sample early, and later blips keep the
+// If the end of the track cuts a blip, the blip stops one sample early, and later blips keep the
 // shortened length.
 void copy_blips(const float *blip, int64_t length, const float *beats, int32_t count, int32_t sr,
                 int64_t n, float *track) {
@@ -69,7 +69,7 @@ void copy_blips(const float *blip, int64_t length, const float *beats, int32_t c
     }
 }
 
-// The low 16 bits of the mix of one sample.
+// Mixes one sample and returns its low 16 bits.
 uint32_t mix_sample(double signal, float blip) {
     const double mixed = (signal * kFullScale + blip * kBlipGain * kFullScale) * 0.5;
     if (!(fabs(mixed) < INT32_MAX)) return 0;
@@ -117,8 +117,8 @@ void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, flo
     free(blip);
 }
 
-// Memory is allocated before the file is created, so that no unfinished file is left, and the blips
-// are made after it, so that a host without a file does not pay for them.
+// Allocates memory before it creates the file, so that no unfinished file is left. Makes the blips
+// afterwards, so that a host without the file does not pay for them.
 void write_click_track(const TAVO_CTX *ctx) {
     if (fnamedec == nullptr || fnamedec[0] == '\0') return;
     const int64_t n = analysis_length(ctx);

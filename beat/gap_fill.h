@@ -1,28 +1,28 @@
-// Stage 6, inside: weaker peaks put back into long gaps between beats.
-// Before: beat/candidates.h, the only caller.
+// Stage 6, inside: adds weaker peaks to long gaps between beats. Called by beat/candidates.h.
 #ifndef TAVO_BEAT_GAP_FILL_H
 #define TAVO_BEAT_GAP_FILL_H
 
 #include "beat/beat_ctx.h"
 
-constexpr int32_t kMaxAddedBeats = 50;  // put back into gaps, all together
+constexpr int32_t kMaxAddedBeats = 50;  // in all gaps together
 
-// Peaks of the envelope as frames.
+// Peaks of the onset envelope.
 struct PEAK_LIST {
-    int32_t *frames;
+    int32_t *frames;  // [count] analysis frames, ascending
     int32_t count;
 };
 
 extern "C" {
 
-// The peaks (ascending, npeaks of them) between frames a and b: all if at most maxn, else the maxn
-// strongest, strongest first. Returns how many were written to dst (capacity maxn).
+// Writes the peaks between the frames a and b to dst[maxn]: all of them if they are at most maxn,
+// else the maxn strongest, strongest first. peaks: [npeaks] ascending. Returns how many it wrote.
 int32_t bringMoreBeat(int32_t a, int32_t b, int32_t *dst, const int32_t *peaks, int32_t npeaks,
                       int32_t maxn, const double *env);
 }
 
-// Puts up to five peaks (ascending) back into each gap longer than three spans or from six seconds
-// on between the count ascending beats in out, seconds, and appends them. Returns how many.
+// Adds up to five peaks to each gap between the count ascending beats (seconds) in out that is
+// longer than three spans or at least six seconds. Appends them to out. peaks: ascending. Returns
+// how many it added.
 int32_t fill_gaps(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, float span, float *out,
                   int32_t count);
 

@@ -10,39 +10,39 @@ namespace {
 
 constexpr double kPowerFloor = 0.0001;  // -80 dB
 
-// A worker of compute_onset_envelope. A job keeps no scaled copy of the signal: worker.signal is
-// null there, and view has the samples.
+// A worker and the samples it reads. Jobs have no scaled copy of the signal: worker.signal is null,
+// and the samples come from view.
 struct group_worker {
     TAVO_ONSET_WORKER worker;
     sample_view view;
 };
-static_assert(offsetof(group_worker, worker) == 0);  // one thread entry takes both records
+static_assert(offsetof(group_worker, worker) == 0);  // the thread entry accepts both records
 
-// The four workers of one envelope and what they share; zero before anything is allocated.
+// The four workers of one envelope and their shared buffers. Zero before they are allocated.
 struct onset_group {
     group_worker members[kBeatWorkers];
     int32_t done[kBeatWorkers];
     double *window;    // [N]
     TAVO_FFT_CTX fft;  // of size N
     double *decibels;  // [F][36]
-    double **mel;      // [F] the rows of decibels
-    float *power;      // [2 * kBeatWorkers][N / 2]
-    float **spectrum;  // [F] rows of power: no row is needed after its frame, each worker has two
+    double **mel;      // [F] pointers to rows of decibels
+    float *power;      // [2 * kBeatWorkers][N / 2] two rows per worker, used in turn
+    float **spectrum;  // [F] pointers to rows of power
 };
 
-// A weight of the mel matrix that is not zero.
+// A non-zero weight of the mel matrix.
 struct mel_term {
     int64_t bin;
     double weight;
 };
 
-// One worker's working memory. Lane 0 is frame k, lane 1 the next one.
+// Scratch of one worker. Lane 0 is analysis frame k, lane 1 the next one.
 struct worker_scratch {
-    double *samples;    // [N + H] of both frames, scaled
+    double *samples;    // [N + H] scaled samples of both frames
     double_pair *re;    // [N], then the powers in [N / 2]
     double_pair *im;    // [N]
-    mel_term *terms;    // of all bands, by band and bin
-    int64_t *band_end;  // [bands] index after the band's last term
+    mel_term *terms;    // terms of all bands, ordered by band, then bin
+    int64_t *band_end;  // [bands] index past the band's last term
 };
 
 double *create_hann_window(int32_t size) {
@@ -89,7 +89,7 @@ void release_scratch(worker_scratch *scratch) {
     free(scratch->band_end);
 }
 
-// Computes the powers of the frames k and next, in single precision, and fills their spectrum rows.
+// Computes the powers of the frames k and next in single precision and fills their spectrum rows.
 void compute_powers(const TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
                     const worker_scratch *scratch) {
     const int64_t shift = (next - k) * worker->hop_size;
@@ -119,8 +119,8 @@ double decibels_of(double power) {
     return 20.0 * log10(power < kPowerFloor ? kPowerFloor : power);
 }
 
-// Fills the mel rows of the frames k and next. As in MultiplyMtxs, a factor of zero leaves its term
-// out.
+// Fills the mel rows of the frames k and next. As in MultiplyMtxs, terms with a zero factor are
+// skipped.
 void compute_bands(const TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
                    const worker_scratch *scratch) {
     const double_pair zero = {0.0, 0.0};
@@ -136,8 +136,8 @@ void compute_bands(const TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
     }
 }
 
-// The work of one worker, two frames at a time; the last of an odd number is paired with itself.
-// If memory runs out, clears the record's mel pointer, which compute_onset_envelope checks.
+// Computes a worker's analysis frames, two at a time; the last of an odd number is paired with
+// itself. If memory runs out, it clears the record's mel pointer, which run_group checks.
 void run_onset_worker(void *record) {
     auto *worker = static_cast<TAVO_ONSET_WORKER *>(record);
     if (worker->first > worker->last) return;
@@ -176,17 +176,17 @@ bool allocate_group(int64_t frames, int32_t frame_size, onset_group *group) {
            group->spectrum != nullptr;
 }
 
-// Fills one worker's record and its rows. If there is only one frame, no worker has it: it may
-// exceed the signal.
+// Fills one worker's record and row pointers. A single frame is given to no worker, because it may
+// extend past the end of the signal.
 void fill_worker(const TAVO_BEAT_CTX *beat, int32_t id, int32_t frame_size, int32_t hop_size,
                  onset_group *group) {
-    const int64_t share = beat->frame_count / kBeatWorkers;
+    const int64_t length = beat->frame_count / kBeatWorkers;
     const int64_t end = beat->frame_count == 1 ? 0 : beat->frame_count;
     TAVO_ONSET_WORKER *worker = &group->members[id].worker;
     worker->id = id;
     worker->signal = beat->signal;
-    worker->first = id * share;
-    worker->last = (id == kBeatWorkers - 1 ? end : (id + 1) * share) - 1;
+    worker->first = id * length;
+    worker->last = (id == kBeatWorkers - 1 ? end : (id + 1) * length) - 1;
     worker->spectrum = group->spectrum;
     worker->frame_size = frame_size;
     worker->hop_size = hop_size;
@@ -207,18 +207,18 @@ void fill_worker(const TAVO_BEAT_CTX *beat, int32_t id, int32_t frame_size, int3
 }
 
 // Returns true if every worker computed all of its frames.
-bool run_group(onset_group *group, const side_work *beside) {
+bool run_group(onset_group *group, const side_work *side) {
     worker_slot slots[kBeatWorkers];
     for (int32_t id = 0; id < kBeatWorkers; ++id) {
         TAVO_ONSET_WORKER *worker = &group->members[id].worker;
         slots[id] = {worker, &worker->thread, _tavo_proc_onsetenv, run_onset_worker};
     }
-    worker_group_run(slots, kBeatWorkers, feat_mutex_mt, feat_cond_mt, group->done, beside);
+    worker_group_run(slots, kBeatWorkers, feat_mutex_mt, feat_cond_mt, group->done, side);
     return std::all_of(group->members, group->members + kBeatWorkers,
                        [](const group_worker &member) { return member.worker.mel != nullptr; });
 }
 
-// Mean absolute difference of two rows, rises and falls alike.
+// Mean absolute difference of two rows: rises and falls both count.
 double spectral_flux(const double *row, const double *next) {
     double sum = 0.0;
     for (int32_t band = 0; band < kMelBands; ++band) {
@@ -228,7 +228,8 @@ double spectral_flux(const double *row, const double *next) {
     return sum / kMelBands;
 }
 
-// env[F - 1]: the flux between all neighbouring rows, in units of its standard deviation.
+// Fills env[count] with the spectral flux between neighbouring rows, divided by its standard
+// deviation.
 void fill_envelope(double *const *mel, int64_t count, double *env) {
     for (int64_t k = 0; k < count; ++k) env[k] = spectral_flux(mel[k], mel[k + 1]);
     double mean = 0.0;
@@ -254,7 +255,7 @@ void _getOnsetEnvelope(TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size
 }
 
 void compute_onset_envelope(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame_size,
-                            int32_t hop_size, const side_work *beside) {
+                            int32_t hop_size, const side_work *side) {
     const bool usable = is_fft_size(frame_size) && hop_size >= 1 &&
                         (view.samples != nullptr || beat->frame_count < 2) &&
                         feat_mutex_mt != nullptr && feat_cond_mt != nullptr;
@@ -264,10 +265,10 @@ void compute_onset_envelope(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame
             fill_worker(beat, id, frame_size, hop_size, &group);
             group.members[id].view = view;
         }
-        const bool complete = run_group(&group, beside);
+        const bool complete = run_group(&group, side);
         if (complete) fill_envelope(group.mel, beat->frame_count - 1, beat->onset_env);
-    } else if (beside != nullptr) {
-        beside->run(beside->arg);
+    } else if (side != nullptr) {
+        side->run(side->arg);
     }
     release_group(&group);
 }

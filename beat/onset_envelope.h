@@ -1,7 +1,7 @@
-// Stage 4: the onset envelope, how much the mel spectrum changes from each frame to the next.
+// Stage 4: the onset envelope, the mean change of the mel spectrum between analysis frames.
 //
 // In: the analysis signal. Out: TAVO_BEAT_CTX.onset_env, one value per hop (256 samples at 11025
-// Hz), in units of its own standard deviation. Before: beat/beat_ctx.h. After: beat/tempo.h,
+// Hz), divided by its standard deviation. Before: beat/beat_ctx.h. After: beat/tempo.h,
 // beat/threshold.h.
 #ifndef TAVO_BEAT_ONSET_ENVELOPE_H
 #define TAVO_BEAT_ONSET_ENVELOPE_H
@@ -10,13 +10,14 @@
 #include "common/worker_group.h"
 #include "dsp/fft.h"
 
-// One of the four threads of the onset envelope; it writes the rows of its own frames only.
+// One of the four threads of the onset envelope. It writes the rows of its own analysis frames
+// only.
 struct TAVO_ONSET_WORKER {
-    int32_t id;  // 0 to 3, also its slot in done_flags
+    int32_t id;  // 0 to 3, also its index in done_flags
     pthread_t thread;
     const double *signal;     // [n]
-    int64_t first;            // frame
-    int64_t last;             // frame, included
+    int64_t first;            // analysis frame
+    int64_t last;             // analysis frame, included
     float **spectrum;         // [F] rows of [N / 2], shared
     int32_t frame_size;       // N
     int32_t hop_size;         // H
@@ -36,20 +37,20 @@ static_assert(sizeof(void *) != 8 || (offsetof(TAVO_ONSET_WORKER, fft) == 64 &&
 
 extern "C" {
 
-// Fills onset_env[0 .. F - 2] on four threads; leaves it as it is if memory runs out. Reads signal,
-// frame_count and mel_matrix (frame_size / 2 rows of 36) of the context, and frame_size, a power of
-// two from 2 to 16384, and hop_size from the arguments, both in samples.
+// Fills onset_env[0 .. F - 2] on four threads, or leaves it unchanged if memory runs out. Reads
+// signal, frame_count and mel_matrix (frame_size / 2 rows of 36) from the context. frame_size, a
+// power of two from 2 to 16384, and hop_size are in samples; the context's own sizes are ignored.
 void _getOnsetEnvelope(TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size);
 
-// Thread entry of one worker, and its completion handler. The argument is the TAVO_ONSET_WORKER.
+// Thread entry of one worker and its completion handler. The argument is the TAVO_ONSET_WORKER.
 void *_tavo_proc_onsetenv(void *record);
 void _thd_cleanup(void *record);
 }
 
-// The body of _getOnsetEnvelope: reads the samples of view instead of the context's signal, which a
-// job leaves null. Meanwhile the calling thread does the side work beside, exactly once whatever
-// becomes of the envelope; null for none.
+// The body of _getOnsetEnvelope. Reads the samples of view instead of the context's signal, which
+// jobs leave null. The calling thread runs the side work, unless it is null, exactly once, even if
+// the envelope cannot be computed.
 void compute_onset_envelope(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame_size,
-                            int32_t hop_size, const side_work *beside);
+                            int32_t hop_size, const side_work *side);
 
 #endif

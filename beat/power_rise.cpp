@@ -9,22 +9,23 @@
 namespace {
 
 constexpr int64_t kBlock = 5512;        // samples, half a second at 11025 Hz
-constexpr double kUnmeasured = -150.0;  // dB of a block without a measured sample
+constexpr double kUnmeasured = -150.0;  // dB of a block without samples
 constexpr int32_t kTopLevel = 32767;    // levels are 16-bit values
 constexpr int32_t kLevelFloor = 1000;   // -30.31 dB
-constexpr int32_t kDecay = 1000;        // the held level loses a thousandth per sample
-constexpr int64_t kReach = 5;           // samples before each sample in its sum, and from it on
-constexpr int64_t kChunk = 256;         // sums at once; even
-static_assert(kBlock % 2 == 0 && kReach % 2 == 1);  // every block measures an even number
-constexpr int64_t kLookAhead = 8;                   // blocks in the four-second mean
-constexpr int64_t kRiseApart = 7;                   // blocks from a rise to the next possible one
-constexpr double kMeanStep = 4.0;    // dB that the quiet blocks are below the mean ahead
-constexpr double kLoudMargin = 3.0;  // dB that the loud part may be below P60
+constexpr int32_t kDecay = 1000;        // an earlier peak decays by a thousandth per sample
+constexpr int64_t kSumRadius =
+    5;  // a sample's sum has this many samples before it, and as many from it on
+constexpr int64_t kChunk = 256;                         // sums computed at once; even
+static_assert(kBlock % 2 == 0 && kSumRadius % 2 == 1);  // every block has an even number of sums
+constexpr int64_t kLookAhead = 8;                       // blocks in the four-second mean
+constexpr int64_t kRiseApart = 7;    // blocks from a rise to the next possible one
+constexpr double kMeanStep = 4.0;    // dB by which the quiet blocks must be below the mean ahead
+constexpr double kLoudMargin = 3.0;  // dB by which the loud part may be below the 60th percentile
 
-// Block b has the samples (b - 1) * kBlock + 1 to b * kBlock, from kReach on.
+// Block b consists of the samples (b - 1) * kBlock + 1 to b * kBlock; block 1 starts at kSumRadius.
 struct block_levels {
     sample_view view;
-    double *db;  // [count + kLookAhead] loudest level of each block, else kUnmeasured
+    double *db;  // [count + kLookAhead] largest level of each block, or kUnmeasured
     int64_t count;
 };
 
@@ -37,15 +38,15 @@ double level_db(int32_t level) {
     return 20.0 * log10((level < kLevelFloor ? kLevelFloor : level) / kFullScale);
 }
 
-// Calls use with the sum of the ten squares around each sample from first on, added in their order;
-// count of them, an even number.
+// Computes the sum of the ten squares around each of count (even) samples from first on, added in
+// their order. Passes the sums to use in pairs.
 template <typename Use>
 void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
-    double squares[kChunk + 2 * kReach];
+    double squares[kChunk + 2 * kSumRadius];
     for (int64_t done = 0; done < count; done += kChunk) {
         const int64_t part = std::min(kChunk, count - done);
-        const int64_t used = part + 2 * kReach - 1;
-        scale_samples({view.samples + (first + done - kReach), view.full_scale}, used, squares);
+        const int64_t used = part + 2 * kSumRadius - 1;
+        scale_samples({view.samples + (first + done - kSumRadius), view.full_scale}, used, squares);
         for (int64_t i = 0; i < used; ++i) squares[i] *= squares[i];
         for (int64_t j = 0; j < part; j += 2) {
             const auto two = [p = squares + j](int64_t k) { return load_pair(p + k); };
@@ -56,75 +57,77 @@ void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
     }
 }
 
-// A mean of ten squares as a level, clamped to 0..32767; NaN becomes 0.
+// The level that belongs to a sum of ten squares, clamped to 0..32767; NaN becomes 0.
 int32_t level_of(double sum) {
     const double mean = sum / 10.0 * kFullScale;
     if (!(mean > 0.0)) return 0;
     return mean < kTopLevel ? static_cast<int32_t>(mean) : kTopLevel;
 }
 
-// The level of a sample: its own, or what an earlier peak has decayed to. *held is carried from
-// sample to sample.
-int32_t follow_level(double sum, int32_t *held) {
-    const int32_t level = std::max(level_of(sum), *held);
-    *held = level - level / kDecay;
+// The level of a sample: its own, or that of an earlier peak that has decayed less. *decayed is the
+// decayed level, updated for the next sample.
+int32_t follow_level(double sum, int32_t *decayed) {
+    const int32_t level = std::max(level_of(sum), *decayed);
+    *decayed = level - level / kDecay;
     return level;
 }
 
-// Samples until a level has decayed to bottom, or below the floor, where it makes no difference.
+// Number of samples until a level has decayed to bottom, or below the floor, where it has no
+// effect.
 constexpr int64_t samples_to_decay(int32_t level, int32_t bottom) {
     int64_t count = 0;
     for (; level > bottom && level >= kLevelFloor; level -= level / kDecay) ++count;
     return count;
 }
 constexpr int64_t kLongestDecay = samples_to_decay(kTopLevel, 0);
-static_assert(kLongestDecay < kBlock - kReach);
+static_assert(kLongestDecay < kBlock - kSumRadius);
 
-// The level held after block b, of which only the last samples, count of them, matter.
-int32_t held_after(sample_view view, int64_t b, int64_t count) {
-    int32_t held = 0;
-    if (b < 1 || count < 1) return held;
+// The decayed level at the end of block b, computed from the block's last count samples.
+int32_t find_decayed_level(sample_view view, int64_t b, int64_t count) {
+    int32_t decayed = 0;
+    if (b < 1 || count < 1) return decayed;
     count += count % 2;
     for_each_sum(view, b * kBlock + 1 - count, count, [&](double_pair sum) {
-        follow_level(sum[0], &held);
-        follow_level(sum[1], &held);
+        follow_level(sum[0], &decayed);
+        follow_level(sum[1], &decayed);
     });
-    return held;
+    return decayed;
 }
 
-// The largest level of block b's samples, what they hold aside. NaN is ignored.
+// The largest level of a sample in block b, without decayed peaks of the block before. NaN is
+// ignored.
 int32_t largest_level(sample_view view, int64_t b) {
-    const int64_t first = b == 1 ? kReach : (b - 1) * kBlock + 1;
+    const int64_t first = b == 1 ? kSumRadius : (b - 1) * kBlock + 1;
     double_pair most = {0.0, 0.0};
     for_each_sum(view, first, b * kBlock + 1 - first,
                  [&](double_pair sum) { most = sum > most ? sum : most; });
     return level_of(std::max(most[0], most[1]));
 }
 
-// The largest level of a block is that of its largest sum, or what is held from the block before;
-// the decibels of the largest level are the largest decibels.
+// Fills blocks->db. A block's largest level belongs to its largest sum, or is what is left of a
+// peak in the block before, so only two levels per block are converted to decibels.
 void measure_blocks(block_levels *blocks, int64_t n) {
     std::fill_n(blocks->db, blocks->count + kLookAhead, kUnmeasured);
     int32_t largest_before = 0;
-    for (int64_t b = 1; b * kBlock <= n - kReach; ++b) {
+    for (int64_t b = 1; b * kBlock <= n - kSumRadius; ++b) {
         const int32_t largest = largest_level(blocks->view, b);
         const int64_t decay = samples_to_decay(largest_before, largest);
-        blocks->db[b] = level_db(std::max(largest, held_after(blocks->view, b - 1, decay)));
+        blocks->db[b] = level_db(std::max(largest, find_decayed_level(blocks->view, b - 1, decay)));
         largest_before = largest;
     }
 }
 
-// First sample from (b - 1) * kBlock to b * kBlock, b at least 2, whose decibels reach target, or
-// -1. The two boundary samples count with the maxima of their blocks.
+// Index of the first sample from (b - 1) * kBlock to b * kBlock whose level reaches target, or -1.
+// b is at least 2. The first and the last sample count with the largest level of their block.
 int64_t find_sample(const block_levels *blocks, int64_t b, double target) {
     const int64_t start = (b - 1) * kBlock;
     if (blocks->db[b - 1] >= target) return start;
-    int32_t held = held_after(blocks->view, b - 1, kLongestDecay);
+    int32_t decayed = find_decayed_level(blocks->view, b - 1, kLongestDecay);
     int64_t sample = start;
     int64_t found = -1;
     const auto test = [&](double sum) {
         ++sample;
-        const int32_t level = follow_level(sum, &held);
+        const int32_t level = follow_level(sum, &decayed);
         if (found < 0 && sample < start + kBlock && level_db(level) >= target) found = sample;
     };
     for_each_sum(blocks->view, start + 1, kBlock, [&](double_pair sum) {
@@ -141,8 +144,8 @@ double mean_ahead(const double *db) {
     return sum * 0.125;
 }
 
-// True if a rise starts in the block at db. Never in an unmeasured one: its 60th percentile would
-// have to be kUnmeasured too, and no block is quieter than that.
+// True if a rise starts in the block at db. Never true for an unmeasured block: the 60th percentile
+// would have to be kUnmeasured too, and no block is quieter.
 bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     const double step = mean - kMeanStep;
     const double quiet = step < limits->mid ? step : limits->mid;
@@ -150,7 +153,7 @@ bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     return db[-2] < quiet && db[-1] < quiet && mean >= loud && db[0] > loud;
 }
 
-// Writes the sample of each rise, ascending, and returns how many there are.
+// Writes the sample of each rise, ascending. Returns how many it wrote.
 int32_t locate_rises(const block_levels *blocks, const rise_limits *limits, int64_t *samples) {
     int32_t count = 0;
     int64_t b = 2;
@@ -166,7 +169,7 @@ int32_t locate_rises(const block_levels *blocks, const rise_limits *limits, int6
     return count;
 }
 
-// sorted: scratch for blocks->count values.
+// sorted: [blocks->count] scratch.
 rise_limits compute_limits(const block_levels *blocks, double *sorted) {
     for (int64_t b = 0; b < blocks->count; ++b) sorted[b] = blocks->db[b];
     quickSort(0, static_cast<int32_t>(blocks->count - 1), sorted);

@@ -6,21 +6,22 @@
 
 namespace {
 
-constexpr double kExcerptEnd = 120.0;           // seconds from the start of the signal, at most
-constexpr double kMinute = 60.0;                // seconds: the excerpt, and the "per minute" of BPM
-constexpr double kSlowestBpm = 30.0;            // sets the largest lag
-constexpr double kPreferredBpm = 120.0;         // centre of the prior
-constexpr double kOctave = 0.6931471805599453;  // ln 2: the prior is one octave wide
-constexpr double kFasterWins = 0.53;            // share of the shorter period above which it wins
-constexpr int32_t kFastestBpm = 200;            // an estimate above it is discarded
+constexpr double kExcerptEnd = 120.0;           // seconds: the excerpt ends here at the latest
+constexpr double kMinute = 60.0;                // seconds: longest excerpt, and the minute in BPM
+constexpr double kSlowestBpm = 30.0;            // determines the largest lag
+constexpr double kPreferredBpm = 120.0;         // centre of the weighting
+constexpr double kOctave = 0.6931471805599453;  // ln 2: the width of the weighting
+constexpr double kFasterWins =
+    0.53;  // part of the shorter period in the sum of both above which it wins
+constexpr int32_t kFastestBpm = 200;  // a faster estimate is replaced by kDefaultBpm
 constexpr int32_t kDefaultBpm = 90;
 
 struct period_candidate {
     double score;
-    int32_t lag;  // frames, 0 for none
+    int32_t lag;  // analysis frames; 0 without a candidate
 };
 
-// Scores of a period and its double. The first of equal maxima wins; a score must exceed 0.
+// Best score of a period and its double. Scores must exceed 0; of equal ones the first wins.
 period_candidate best_of_two(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 2; ++k) {
@@ -30,7 +31,7 @@ period_candidate best_of_two(const double *r, int32_t lags) {
     return best;
 }
 
-// The same for a period and its triple.
+// Best score of a period and its triple.
 period_candidate best_of_three(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 3; ++k) {
@@ -40,7 +41,7 @@ period_candidate best_of_three(const double *r, int32_t lags) {
     return best;
 }
 
-// The beat period in frames, 0 if no candidate has a score.
+// The beat period in analysis frames; 0 without a candidate.
 int32_t choose_period(const double *r, int32_t lags) {
     const period_candidate two = lags < 4 ? period_candidate{0.0, 0} : best_of_two(r, lags);
     const period_candidate three = lags < 6 ? period_candidate{0.0, 0} : best_of_three(r, lags);
@@ -52,8 +53,7 @@ int32_t choose_period(const double *r, int32_t lags) {
     return ratio > kFasterWins ? shorter : longer;
 }
 
-// A preference for tempi near 120 BPM: a Gaussian in octaves. At lag 0 the tempo is infinite and
-// the weight 0.
+// Weights the lags by a Gaussian in octaves around 120 BPM. The weight of lag 0 is 0.
 void weigh_lags(double *r, int32_t lags, double hop) {
     const double frames_per_minute = kMinute / hop;
     for (int32_t t = 0; t < lags; ++t) {
@@ -62,8 +62,8 @@ void weigh_lags(double *r, int32_t lags, double hop) {
     }
 }
 
-// Replaces the excerpt in re[nfft] by its circular autocorrelation, re[t] for t < lags. Lags from
-// nfft on repeat.
+// Replaces the excerpt in re[nfft] by its circular autocorrelation, re[t] for t < lags. From nfft
+// on it repeats.
 int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32_t lags) {
     if (tavo_dft(re, im, nfft, count, 1) != 0) return TAVO_ERR_MEMORY;
     for (int64_t k = 0; k < nfft; ++k) re[k] = re[k] * re[k] + im[k] * im[k];
@@ -74,15 +74,15 @@ int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32
     return 0;
 }
 
-// The smallest power of two not below count.
+// The smallest power of two that is at least count.
 int64_t transform_size(int64_t count) {
     int64_t size = 1;
     while (size < count) size *= 2;
     return size;
 }
 
-// The period of the excerpt x[count]; 0 for none; TAVO_ERR_MEMORY. A single NaN, as in silence,
-// makes every correlation NaN: the transforms are skipped.
+// The beat period of the excerpt x[count] in analysis frames; 0 without one; TAVO_ERR_MEMORY. A
+// single NaN, as in silence, would make every correlation NaN, so the transforms are skipped.
 int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, double hop) {
     for (int32_t i = 0; i < count; ++i) {
         if (!std::isfinite(x[i])) return 0;

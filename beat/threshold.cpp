@@ -29,15 +29,16 @@ void sort_ascending(double *values, int32_t count) {
     for (int32_t i = 1; i < count; ++i) move_down(values, i);
 }
 
-// The percentile of env[0 .. count - 1]. scratch: [count].
+// The percentile of env[count]. scratch: [count].
 double percentile_of(const double *env, int32_t count, double *scratch) {
     for (int32_t i = 0; i < count; ++i) scratch[i] = env[i];
     sort_ascending(scratch, count);
     return scratch[percentile_index(count, kPercentile)];
 }
 
-// Slides the sorted window over the worker's range: at index i it holds the W values from half a
-// window before i on. Each step replaces the value that leaves by the one that enters.
+// Slides the sorted window over the worker's range. At index i it holds the W values that start
+// half a window before i. Each step replaces the value that leaves the window by the one that
+// enters.
 void slide_window(TAVO_THRES_WORKER *worker, double *win) {
     const int32_t size = worker->window;
     const int32_t half = size / 2;
@@ -62,8 +63,8 @@ void slide_window(TAVO_THRES_WORKER *worker, double *win) {
     }
 }
 
-// The work of one worker. If memory runs out, clears the record's thr pointer, which run_workers
-// checks.
+// Computes a worker's range. If memory runs out, it clears the record's thr pointer, which
+// run_workers checks.
 void run_thres_worker(void *record) {
     auto *worker = static_cast<TAVO_THRES_WORKER *>(record);
     if (worker->first > worker->last || worker->window < 1) return;
@@ -76,22 +77,22 @@ void run_thres_worker(void *record) {
     free(win);
 }
 
-// Four equal ranges over the indices whose window fits; all empty if none fits. Neighbours share
-// their boundary index; only the earlier worker is given it, so that no value is written by two
-// threads.
+// Divides the indices whose window fits into four equal ranges; all are empty if no window fits.
+// Neighbouring ranges would share their boundary index; it belongs to the earlier worker, so that
+// no two threads write the same value.
 void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
                   TAVO_THRES_WORKER *workers, int32_t *done) {
     const int64_t count = beat->frame_count - 1;
     const int64_t half = window / 2;
-    const int64_t share = (count - window) / kBeatWorkers;
+    const int64_t length = (count - window) / kBeatWorkers;
     for (int32_t id = 0; id < kBeatWorkers; ++id) {
         TAVO_THRES_WORKER *worker = &workers[id];
         const bool is_last = id == kBeatWorkers - 1;
         worker->id = id;
         worker->thr = thr;
         worker->onset_env = beat->onset_env;
-        worker->first = id * share + half + (id == 0 ? 0 : 1);
-        worker->last = is_last ? count - half : (id + 1) * share + half;
+        worker->first = id * length + half + (id == 0 ? 0 : 1);
+        worker->last = is_last ? count - half : (id + 1) * length + half;
         if (beat->frame_count < window) worker->last = worker->first - 1;
         worker->window = window;
         worker->percentile = kPercentile;
@@ -102,7 +103,7 @@ void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
     }
 }
 
-// Fills the middle of thr and sets *top to the largest value there, at least 0.
+// Fills the middle of thr and raises *top to the largest value there.
 int32_t run_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr, double *top) {
     TAVO_THRES_WORKER workers[kBeatWorkers] = {};
     int32_t done[kBeatWorkers] = {};
@@ -120,7 +121,7 @@ int32_t run_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr, doub
     return 0;
 }
 
-// After the last full window, a straight line towards top.
+// Fills the part after the last full window with a straight line towards top.
 void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
     const int64_t fitting = count - window / 2;
     const int64_t start = fitting > 1 ? fitting : 1;
@@ -130,8 +131,8 @@ void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
     }
 }
 
-// Before the first full window, the percentile of the second around each index; the first half
-// second stays 0. At the end of a short signal the second is cut to the values that exist.
+// Fills the part before the first full window with the percentile of the second around each index;
+// the first half second stays 0. In a short signal the second is cut off at the end.
 void fill_head(const TAVO_BEAT_CTX *beat, int32_t window, int32_t second, double *thr,
                double *scratch) {
     const int64_t count = beat->frame_count - 1;
@@ -167,7 +168,8 @@ int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, float hop, do
     double top = 0.0;
     const int32_t code = run_workers(beat, window, thr, &top);
     if (code == 0 && window >= 2) {
-        // One or two values short of a full window, the middle gets the percentile of all values.
+        // If the envelope is one or two values shorter than the window, the middle entry gets the
+        // percentile of all values.
         if (frames < window && frames >= window - 2 && half < frames - 1) {
             thr[half] = percentile_of(beat->onset_env, static_cast<int32_t>(frames), scratch);
             if (thr[half] > top) top = thr[half];

@@ -31,7 +31,7 @@ void worker_group_done(pthread_mutex_t *mutex, pthread_cond_t *cond, int32_t *do
 }
 
 void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *mutex,
-                      pthread_cond_t *cond, int32_t *done, const side_work *beside) {
+                      pthread_cond_t *cond, int32_t *done, const side_work *side) {
     bool started[kMaxWorkers] = {};
     if (count > kMaxWorkers) count = kMaxWorkers;
 
@@ -46,7 +46,7 @@ void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *
         }
     }
 
-    if (beside != nullptr) beside->run(beside->arg);
+    if (side != nullptr) side->run(side->arg);
     pthread_mutex_lock(mutex);
     while (!all_done(done, count)) pthread_cond_wait(cond, mutex);
     pthread_mutex_unlock(mutex);

@@ -34,11 +34,11 @@ struct side_work {
     void *arg;
 };
 
-// Clears the done flags, starts count workers (at most 4) in order, does the side work beside (null
+// Clears the done flags, starts count workers (at most 4) in order, does the side work (null
 // for none), waits until every flag is set and joins the threads. If a thread cannot be started,
 // its worker's body runs on the calling thread.
 void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *mutex,
-                      pthread_cond_t *cond, int32_t *done, const side_work *beside = nullptr);
+                      pthread_cond_t *cond, int32_t *done, const side_work *side = nullptr);
 
 // Allocates and initialises a mutex and a condition. Returns TAVO_OK; TAVO_ERR_MEMORY, both null.
 int32_t worker_lock_create(pthread_mutex_t **mutex, pthread_cond_t **cond);
