@@ -7,9 +7,9 @@
 
 namespace {
 
-constexpr int64_t kHugePageBytes = 2 << 20;  // of most systems
+constexpr int64_t kHugePageBytes = 2 << 20;  // on most systems
 
-int32_t incomplete = 0;  // atomic access only: threads of the job set it
+int32_t incomplete = 0;  // atomic access only: the job's threads set it
 
 uintptr_t page_size() {
     return static_cast<uintptr_t>(sysconf(_SC_PAGESIZE));
@@ -19,9 +19,9 @@ uintptr_t page_size() {
 
 void advise_huge_pages(void *buffer, int64_t bytes) {
     if (buffer == nullptr || bytes < kLargeBytes) return;
-    // Outwards to whole pages: neighbouring buffers then share huge pages, and each stays one
-    // mapping, which realloc can move. The advice does not change what else the first and last page
-    // hold.
+    // Extends the range to whole pages, so that neighbouring buffers share huge pages and each
+    // buffer stays one mapping, which realloc can move. The advice does no harm to other data in
+    // the first and last page.
     const uintptr_t page = page_size();
     const uintptr_t before = reinterpret_cast<uintptr_t>(buffer) % page;
     const uintptr_t pages = (before + static_cast<uintptr_t>(bytes) + page - 1) / page;
@@ -29,7 +29,7 @@ void advise_huge_pages(void *buffer, int64_t bytes) {
 }
 
 uint8_t *allocate_buffer(int64_t bytes) {
-    // At least one byte: an empty request may be answered by null.
+    // Asks for at least one byte, because malloc(0) may return null.
     const auto size = static_cast<size_t>(std::max<int64_t>(bytes, 1));
     if (bytes < kLargeBytes) return static_cast<uint8_t *>(malloc(size));
     void *buffer = nullptr;

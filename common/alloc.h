@@ -1,7 +1,7 @@
 // Checked sizes and zeroed memory, for every folder of the library.
 //
-// Sizes are 64-bit and checked for overflow because they are computed from durations and rates that
-// files state.
+// Sizes are computed from durations and rates stated by files, so they are 64-bit and checked for
+// overflow.
 #ifndef TAVO_COMMON_ALLOC_H
 #define TAVO_COMMON_ALLOC_H
 
@@ -11,8 +11,8 @@
 
 constexpr int64_t kBytesPerSample = 2;  // 16-bit mono
 
-// *result = value * factor / divisor. False if value or factor is negative, divisor is below 1, or
-// the product overflows.
+// Computes *result = value * factor / divisor. False if value or factor is negative, divisor is
+// below 1, or the product overflows.
 inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *result) {
     int64_t product = 0;
     if (value < 0 || factor < 0 || divisor < 1) return false;
@@ -21,18 +21,19 @@ inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *
     return true;
 }
 
-// Bytes of a span of PCM: units (100 ns) * rate (Hz) * 2 / 10,000,000, divided last. May be odd.
+// Computes the bytes of a span of PCM: units (100 ns) * rate (Hz) * 2 / 10,000,000, divided last.
+// They may be odd.
 inline bool span_bytes(int64_t units, int32_t rate, int64_t *bytes) {
     return scale_size(units, rate * kBytesPerSample, kUnitsPerSecond, bytes);
 }
 
-// Bytes of count elements of size bytes each, followed by extra bytes.
+// Computes the bytes of count elements of size bytes each, plus extra bytes.
 inline bool array_bytes(int64_t count, int64_t size, int64_t extra, int64_t *bytes) {
     return scale_size(count, size, 1, bytes) && !__builtin_add_overflow(*bytes, extra, bytes);
 }
 
-// Zeroed memory for count items, at least one; the caller's to free. Null if memory runs out or the
-// size exceeds size_t.
+// Allocates zeroed memory for count items, at least one. The caller frees it. Null if memory runs
+// out or the size exceeds size_t.
 template <typename T>
 T *zeroed_items(int64_t count) {
     const uint64_t items = count > 0 ? static_cast<uint64_t>(count) : 1;
@@ -40,33 +41,32 @@ T *zeroed_items(int64_t count) {
     return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
 }
 
-// True if a job lacks part of its audio or of its search, because a read or an allocation has
-// failed since tavo_decode_init cleared the mark. Process-wide, as the decoding is: one instance at
-// a time.
+// True if a job has lost part of its audio or of its search, because a read or an allocation has
+// failed since tavo_decode_init cleared the mark. The mark is process-wide, since only one instance
+// may exist.
 bool is_incomplete();
 void mark_incomplete();
 void clear_incomplete();
 
-// Returns memory, after marking the job incomplete if it is null.
+// Marks the job incomplete if memory is null. Returns memory.
 inline void *note_shortage(void *memory) {
     if (memory == nullptr) mark_incomplete();
     return memory;
 }
 
-constexpr int64_t kLargeBytes = 4 << 20;  // from here on pages are worth the calls below
+constexpr int64_t kLargeBytes = 4 << 20;  // the calls below pay off from this size on
 
-// Asks for huge pages under a large buffer that is about to be filled: one page fault instead of
-// 512, a fifth of the time. Other systems may not grant them; nothing else changes.
+// Asks for huge pages for a large buffer before it is filled: one page fault instead of 512, at a
+// fifth of the time. The system may ignore the request.
 void advise_huge_pages(void *buffer, int64_t bytes);
 
-// Uninitialised memory, at least one byte; the caller's to free. A large buffer begins at a huge
-// page, so that the allocator's header before it does not break up the first one. Null if memory
-// runs out.
+// Allocates uninitialised memory, at least one byte. The caller frees it. A large buffer starts at
+// a huge page, so that the allocator's header does not split the first one. Null if memory runs
+// out.
 uint8_t *allocate_buffer(int64_t bytes);
 
-// Gives the whole pages from begin to end back to the system. They stay allocated and read as
-// zeros; begin and end are in one buffer of the heap. Returns the end of the last page released, or
-// begin if there was none.
+// Returns the whole pages from begin to end, within one heap buffer, to the system. They stay
+// allocated and read as zeros. Returns the end of the last page released, or begin.
 const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end);
 
 #endif

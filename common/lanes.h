@@ -1,6 +1,5 @@
-// Vector types: several numbers side by side in one register, by the compiler's vector extension.
-// Each lane is rounded as it would be alone. Used where independent runs of the same arithmetic can
-// go side by side.
+// Vector types: several numbers in one register, by the compiler's vector extension. Each lane is
+// rounded as it would be alone. Used where the same arithmetic is done for independent data.
 #ifndef TAVO_COMMON_LANES_H
 #define TAVO_COMMON_LANES_H
 
@@ -15,15 +14,15 @@ typedef int32_t int_quad __attribute__((vector_size(16)));
 typedef int64_t int64_pair __attribute__((vector_size(16)));
 typedef int16_t int16_octet __attribute__((vector_size(16)));
 
-// from, to: any two neighbouring doubles, aligned as doubles are.
-inline double_pair load_pair(const double *from) {
+// Loads (stores) two neighbouring doubles, which need only the alignment of a double.
+inline double_pair load_pair(const double *values) {
     double_pair pair;
-    memcpy(&pair, from, sizeof pair);
+    memcpy(&pair, values, sizeof pair);
     return pair;
 }
 
-inline void store_pair(double *to, double_pair pair) {
-    memcpy(to, &pair, sizeof pair);
+inline void store_pair(double *values, double_pair pair) {
+    memcpy(values, &pair, sizeof pair);
 }
 
 #endif

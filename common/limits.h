@@ -1,14 +1,14 @@
-// What a file must have to be analysed. The stages refuse what breaks a limit; the command names
-// the limit to the user.
+// Limits of the files that can be analysed. The stages refuse a file beyond a limit; the command
+// reports the limit to the user.
 #ifndef TAVO_COMMON_LIMITS_H
 #define TAVO_COMMON_LIMITS_H
 
 #include "common/tavo_ctx.h"
 
 constexpr int32_t kPathBytes = TAVO_PATH_BYTES;
-constexpr int32_t kHeadBytes = TAVO_MIN_FILE_BYTES;  // read to recognise a format
+constexpr int32_t kHeadBytes = TAVO_MIN_FILE_BYTES;  // bytes read to recognise a format
 constexpr int32_t kMinRate = TAVO_MIN_RATE;          // Hz
-constexpr int32_t kMaxRate = TAVO_MAX_RATE;          // Hz, of all formats but FLAC
-constexpr int64_t kRefusedUnits = kUnitsPerSecond;   // streams up to this length are too short
+constexpr int32_t kMaxRate = TAVO_MAX_RATE;          // Hz, for all formats except FLAC
+constexpr int64_t kRefusedUnits = kUnitsPerSecond;   // streams up to this length are refused
 
 #endif

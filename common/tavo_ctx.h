@@ -1,8 +1,8 @@
-// The records that several folders share: the instance, TAVO_CTX, and its parts.
+// Records that several folders share: the instance, TAVO_CTX, and its parts.
 //
-// The instance owns everything that its pointers lead to, except the callback. The decoding counts
-// time in 100-ns units (10,000,000 per second), results are in milliseconds. Made and released by
-// core/instance.h.
+// The instance owns everything that its pointers lead to, except the callback. Decoding counts time
+// in 100-ns units (10,000,000 per second); results are in milliseconds. core/instance.h creates and
+// releases instances.
 #ifndef TAVO_COMMON_TAVO_CTX_H
 #define TAVO_COMMON_TAVO_CTX_H
 
@@ -28,24 +28,24 @@ constexpr int32_t kAnalysisRate = 11025;  // Hz, modes 1 and 2
 constexpr int32_t kFrameSize = 512;       // samples at the analysis rate
 constexpr int32_t kHopSize = 256;         // samples at the analysis rate
 
-// The stream's format, as the media source reports it.
+// Format of the stream, as the media source reports it.
 struct TAVO_FMT {
     int32_t sample_rate;  // Hz
-    int32_t channels;     // of the decoder's output; the PCM delivered always has one
+    int32_t channels;     // of the decoder's output; the delivered PCM always has one
     int32_t bits;         // 16
 };
 
-// Modes 0 and 2.
+// Highlight: modes 0 and 2.
 struct TAVO_HL_CTX {
-    int32_t hl_param;     // highlight length wanted, seconds; 0 or less for none
+    int32_t hl_param;     // highlight length requested, seconds; 0 or less for any
     float *power;         // [power_count] one loudness value per 2 s, owned
-    int32_t power_count;  // envelope values
+    int32_t power_count;  // values in power
     uint32_t hl_pos;      // highlight start, milliseconds
 };
 
-// Modes 1 and 2.
+// Beats: modes 1 and 2.
 struct TAVO_ONSET_CTX {
-    int32_t max_beats;    // maximum number of threshold-selected beats, 0 or less for no limit
+    int32_t max_beats;    // maximum number of threshold-selected beats; 0 or less for no limit
     int32_t beat_param2;  // stored, never read
     int32_t beat_count;   // entries of beat_times
     float *beat_times;    // [beat_count] ms, ascending, owned; TAVO_INFO.beat_times points here
@@ -55,10 +55,10 @@ struct TAVO_ONSET_CTX {
 };
 
 struct TAVO_CTX {
-    char magic[4];          // "ZEKA", written last at creation
+    char magic[4];          // "ZEKA", written last when the instance is created
     int32_t quit;           // 1 once a stop was requested; atomic access only
     int16_t *pcm;           // source-rate PCM, mono; null once converted
-    int64_t pcm_bytes;      // bytes: capacity before decoding, then bytes decoded
+    int64_t pcm_bytes;      // bytes: capacity before decoding, bytes decoded afterwards
     double *ana;            // analysis signal on the 16-bit scale, mono
     int64_t ana_len;        // samples in ana
     int32_t ana_rate;       // Hz: 11025, or 0 in mode 0
@@ -88,7 +88,7 @@ static_assert(sizeof(void *) != 8 ||
 static_assert(sizeof(void *) != 8 ||
               (offsetof(TAVO_INFO, beat_times) == 8 && offsetof(TAVO_INFO, status) == 16));
 
-// Access to a flag (state, quit) that one thread writes while another reads it without the lock.
+// Access to a flag (state, quit) that one thread writes and others read without a lock.
 inline int32_t load_flag(const int32_t *flag) {
     return __atomic_load_n(flag, __ATOMIC_ACQUIRE);
 }

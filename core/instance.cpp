@@ -12,20 +12,21 @@ namespace {
 
 constexpr char kMark[4] = {'Z', 'E', 'K', 'A'};
 
-// The result record of an instance made here, and who listens to it.
+// The result record of an instance, followed by the listener and its argument.
 struct result_record {
-    TAVO_INFO info;  // first: TAVO_CTX.info points to it
+    TAVO_INFO info;  // must be first: TAVO_CTX.info points to it
     TAVO_LISTENER listener;
-    void *user;  // the host's
+    void *user;  // the host's argument
 };
 
-// The callback of an instance that has a listener.
+// The callback of instances that have a listener.
 void call_listener(TAVO_INFO *info) {
     const auto *record = reinterpret_cast<const result_record *>(info);
     record->listener(info, record->user);
 }
 
-// The instance with its result record and the sub-contexts of its mode, or null.
+// Creates an instance with its result record and the sub-contexts of its mode. Null if memory runs
+// out.
 TAVO_CTX *new_instance(int32_t mode) {
     auto *ctx = zeroed_items<TAVO_CTX>(1);
     if (ctx == nullptr) return nullptr;
@@ -57,7 +58,7 @@ TAVO_CTX *open_instance(const TAVO_PARAM *param, int32_t *err) {
     TAVO_CTX *ctx = new_instance(param->mode);
     if (ctx == nullptr) return nullptr;
     if (tavo_decode_init(ctx, param) != 0) {
-        *err = TAVO_ERR_HANDLE;  // one code for every reason: the media source knows the details
+        *err = TAVO_ERR_HANDLE;  // one code for every reason; tavo_probe returns the reason
         clearTavoCtx(ctx);
         return nullptr;
     }

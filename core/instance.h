@@ -1,7 +1,7 @@
 // The instance: its creation, its check and its release.
 //
-// In: TAVO_PARAM. Out: TAVO_CTX with its sub-contexts and a planned decoding.
-// Before: pcm/decode.h. After: core/lifecycle.h.
+// In: TAVO_PARAM. Out: TAVO_CTX with its sub-contexts and a planned decoding. Before: pcm/decode.h.
+// After: core/lifecycle.h.
 #ifndef TAVO_CORE_INSTANCE_H
 #define TAVO_CORE_INSTANCE_H
 
@@ -9,22 +9,22 @@
 
 extern "C" {
 
-// Releases the instance and everything that it owns. The instance may be half built. No checks.
+// Releases the instance, which may be half built, and everything that it owns. Checks nothing.
 void clearTavoCtx(TAVO_CTX *ctx);
 }
 
-// Makes an instance in the ready state. The locks of core/lifecycle.h exist already. Returns the
-// instance, owned by the caller, with *err TAVO_OK; or null with *err TAVO_ERR_MEMORY or, when the
-// decoding cannot be prepared, TAVO_ERR_HANDLE, and everything made here is released.
+// Creates an instance in the ready state; the locks of core/lifecycle.h must exist. Returns it with
+// *err TAVO_OK; the caller owns it. On failure returns null, releases everything and sets *err to
+// TAVO_ERR_MEMORY or, if the decoding cannot be planned, TAVO_ERR_HANDLE.
 TAVO_CTX *open_instance(const TAVO_PARAM *param, int32_t *err);
 
-// True for a handle that is not null and carries the mark.
+// True if the handle is not null and has the mark of an instance.
 bool is_instance(const TAVO_CTX *ctx);
 
-// True once the job has set its final state.
+// True if the job has set its final state.
 bool has_ended(const TAVO_CTX *ctx);
 
-// True if a mode finds beats, or a highlight. Both are false for a mode outside 0 to 2.
+// True if a mode finds beats (a highlight). Both are false for a mode outside 0 to 2.
 inline bool finds_beats(int32_t mode) {
     return mode == TAVO_MODE_BEATS || mode == TAVO_MODE_BOTH;
 }

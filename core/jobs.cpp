@@ -8,11 +8,10 @@
 
 namespace {
 
-// TAVO_INFO.status
+// Values of TAVO_INFO.status.
 constexpr int32_t kStatusResult = 0;
 constexpr int32_t kStatusFailure = -1;
 
-// The first step of every job.
 void decode(TAVO_CTX *ctx) {
     ctx->pcm_bytes = decode_segments(ctx, ctx->pcm, ctx->pcm_bytes, segment_pages::released);
 }
@@ -21,15 +20,15 @@ void deliver(TAVO_CTX *ctx) {
     if (ctx->callback != nullptr) ctx->callback(ctx->info);
 }
 
-// Beat times count from the start of the analysed signal; hosts want them from the start of the
-// file.
+// Beat times count from the start of the analysed signal. Converts them to times from the start of
+// the file.
 void shift_beats(TAVO_ONSET_CTX *onset, int32_t start_ms) {
     const auto shift = static_cast<float>(start_ms);
     for (int32_t i = 0; i < onset->beat_count; ++i) onset->beat_times[i] += shift;
 }
 
-// Runs the beat analysis, unless the conversion to the analysis rate failed, and reports. No beats
-// is a failure, whatever the reason; a highlight that was found before is reported in any case.
+// Runs the beat analysis if the conversion to the analysis rate succeeded, and reports the result.
+// A job without beats fails, whatever the reason. A highlight is reported in any case.
 void find_and_report_beats(TAVO_CTX *ctx, bool from_highlight, bool converted) {
     TAVO_INFO *info = ctx->info;
     TAVO_ONSET_CTX *onset = converted ? ctx->onset : nullptr;

@@ -31,18 +31,19 @@ void destroy_locks() {
     pthread_mutex_destroy(&tavo_mutex);
 }
 
-// Polls without sleeping, so that a stop takes no longer than the rest of the job; yields, so that
-// the job gets the processor if there is only one.
+// Polls without sleeping, so that stopping takes no longer than the rest of the job. Yields, so
+// that the job can run on a single processor.
 void poll_until_ended(const TAVO_CTX *ctx) {
     while (!has_ended(ctx)) sched_yield();
 }
 
-// True inside the callback of the job that tavo_analyze started: tavo_deinit would join itself.
+// True inside the callback of the job that tavo_analyze started, where tavo_deinit would join its
+// own thread.
 bool runs_job_of(const TAVO_CTX *ctx) {
     return pthread_equal(ctx->worker, pthread_self()) != 0;
 }
 
-// There is nothing to join if the job was run without tavo_analyze, on a thread of the host's.
+// A job that the host runs on its own thread, without tavo_analyze, has no thread to join.
 void join_worker(const TAVO_CTX *ctx) {
     if (pthread_equal(ctx->worker, pthread_t{}) == 0) pthread_join(ctx->worker, nullptr);
 }
@@ -50,8 +51,8 @@ void join_worker(const TAVO_CTX *ctx) {
 }  // namespace
 
 extern "C" TAVO_CTX *tavo_init(const TAVO_PARAM *param, int32_t *err) {
-    int32_t unread = 0;
-    if (err == nullptr) err = &unread;
+    int32_t ignored = 0;
+    if (err == nullptr) err = &ignored;
     *err = TAVO_ERR_HANDLE;
     if (param == nullptr || !create_locks()) return nullptr;
     TAVO_CTX *ctx = open_instance(param, err);
@@ -74,7 +75,7 @@ extern "C" int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_bea
         ctx->onset->beat_param2 = beat_param2;
     }
 
-    // Before the thread exists: a quick job's final state must not be overwritten.
+    // Set before the thread exists, so that a quick job's final state is not overwritten.
     store_flag(&ctx->state, kStateRunning);
     if (pthread_create(&ctx->worker, nullptr, kJobs[ctx->mode], ctx) != 0) {
         ctx->worker = pthread_t{};
@@ -94,7 +95,7 @@ extern "C" int32_t tavo_deinit(TAVO_CTX *ctx) {
         pthread_mutex_lock(&tavo_mutex);
         join_worker(ctx);
     } else if (has_ended(ctx)) {
-        join_worker(ctx);  // at most its callback still runs
+        join_worker(ctx);  // only its callback may still be running
     }
     clearTavoCtx(ctx);
     pthread_mutex_unlock(&tavo_mutex);

@@ -1,7 +1,8 @@
-// The instance's life between creation and release: its two locks, the start of its job, the stop.
+// The life of an instance between creation and release: its two locks, the start of its job, the
+// stop.
 //
-// In: the calls of include/tavo.h. Out: a job of core/jobs.h on a thread of its own.
-// Before: core/instance.h, core/jobs.h. After: the host.
+// In: the calls of include/tavo.h. Out: a job of core/jobs.h on its own thread. Before:
+// core/instance.h, core/jobs.h. After: the host.
 #ifndef TAVO_CORE_LIFECYCLE_H
 #define TAVO_CORE_LIFECYCLE_H
 
@@ -9,16 +10,18 @@
 
 extern "C" {
 
-// tavo_mutex guards the writing of quit and the decision of tavo_deinit; tavo_cond carries the one
-// signal that the job has ended. Both exist from tavo_init to tavo_deinit.
+// tavo_mutex guards writes to quit and the test of the state in tavo_deinit. tavo_cond signals the
+// end of the job. Both exist from tavo_init to tavo_deinit.
 extern pthread_mutex_t tavo_mutex;
 extern pthread_cond_t tavo_cond;
 
-// Raises the stop flag and waits until the job has ended; its callback may still run. The caller
-// does not hold tavo_mutex. Returns TAVO_OK, at once if no job was started; TAVO_ERR_HANDLE.
+// Sets the stop flag and waits until the job has ended; its callback may still be running. The
+// caller must not hold tavo_mutex. Returns TAVO_OK, immediately if no job was started;
+// TAVO_ERR_HANDLE.
 int32_t _tavo_quit(TAVO_CTX *ctx);
 
-// Thread entry of the watcher that _tavo_quit starts: polls the state, then signals tavo_cond.
+// Thread entry of the watcher that _tavo_quit starts. It polls the state and then signals
+// tavo_cond.
 void *_thd_quit_wait(void *arg);
 }
 
