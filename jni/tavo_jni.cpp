@@ -16,34 +16,34 @@ constexpr char kHostClass[] = "com/kestu/tavo/Tavo";
 constexpr char kPostEvent[] = "postEventFromNative";
 constexpr char kPostEventSignature[] = "(Ljava/lang/Object;III[F)V";
 
-constexpr jint kFailed = -1;  // of analyze and deinit
+constexpr jint kFailed = -1;  // returned by analyze and deinit
 
 constexpr jint kEventResult = 1;
 constexpr jint kEventFailure = 2;
 
-// The references that native_setup stored. Counted, because a later native_setup may replace them
-// while a worker thread is posting an event with them.
+// References stored by native_setup. They are counted, because a later native_setup may replace
+// them while a worker thread posts an event with them.
 struct host_refs {
     jclass host_class;  // global reference
-    jobject object;     // global reference; null when the host gave null
-    int32_t users;      // the bridge itself and each event being posted; under host_mutex
+    jobject object;     // global reference, or null if the host passed null
+    int32_t users;      // the bridge itself and each event in progress; guarded by host_mutex
 };
 
 pthread_mutex_t host_mutex = PTHREAD_MUTEX_INITIALIZER;
-host_refs *current_host = nullptr;  // under host_mutex
+host_refs *current_host = nullptr;  // guarded by host_mutex
 
-// What init lets tavo_jni_mutex point at when it is null. Static, so that creating it cannot fail.
+// tavo_jni_mutex points here after the first init. Static, so that its creation cannot fail.
 pthread_mutex_t lifecycle_mutex = PTHREAD_MUTEX_INITIALIZER;
 
-// Pointers that one thread publishes and others read without a lock: atomic access only.
+// Pointers that one thread sets and others read without a lock. Atomic access only.
 JavaVM *java_vm = nullptr;
 jmethodID post_event = nullptr;
 TAVO_CTX *instance = nullptr;
 
-TAVO_PARAM init_param = {};  // under tavo_jni_mutex; path is null outside tavo_init
+TAVO_PARAM init_param = {};  // guarded by tavo_jni_mutex; path is null outside tavo_init
 
 // The thread that is posting an event, or zero. A deinit on that thread must not wait for the lock,
-// which a deinit on another thread may hold while it joins this one. Atomic access only.
+// which a deinit on another thread may hold while it joins the first. Atomic access only.
 pthread_t posting_thread = {};
 
 template <typename T>
@@ -71,7 +71,8 @@ long handle_value(const TAVO_CTX *ctx) {
 
 // ---- the lock of init and deinit ----
 
-// Creates the lock if there is none. Two threads that are first together get the same one.
+// Creates the lock on first use, and locks it. Two threads that come first at the same time get the
+// same lock.
 pthread_mutex_t *lock_for_init() {
     pthread_mutex_t *mutex = nullptr;
     const bool created = __atomic_compare_exchange_n(&tavo_jni_mutex, &mutex, &lifecycle_mutex,
@@ -81,7 +82,7 @@ pthread_mutex_t *lock_for_init() {
     return mutex;
 }
 
-// Null, with nothing locked, before the first init.
+// Returns null and locks nothing before the first init.
 pthread_mutex_t *lock_for_deinit() {
     pthread_mutex_t *mutex = load_pointer(&tavo_jni_mutex);
     if (mutex != nullptr) pthread_mutex_lock(mutex);
@@ -94,7 +95,7 @@ void unlock(pthread_mutex_t *mutex) {
 
 // ---- the host's class and object ----
 
-host_refs *hold_host() {
+host_refs *acquire_host() {
     pthread_mutex_lock(&host_mutex);
     host_refs *host = current_host;
     if (host != nullptr) ++host->users;
@@ -108,8 +109,8 @@ void delete_host(JNIEnv *env, host_refs *host) {
     free(host);
 }
 
-// The last user deletes the references.
-void drop_host(JNIEnv *env, host_refs *host) {
+// Releases one use of the references. The last user deletes them.
+void release_host(JNIEnv *env, host_refs *host) {
     if (host == nullptr) return;
     pthread_mutex_lock(&host_mutex);
     const bool last = --host->users == 0;
@@ -117,13 +118,13 @@ void drop_host(JNIEnv *env, host_refs *host) {
     if (last) delete_host(env, host);
 }
 
-// Null if memory runs out.
-host_refs *make_host(JNIEnv *env, jclass host_class, jobject obj) {
+// Returns null if memory runs out.
+host_refs *create_host(JNIEnv *env, jclass host_class, jobject obj) {
     auto *host = static_cast<host_refs *>(calloc(1, sizeof(host_refs)));
     if (host == nullptr) return nullptr;
     host->users = 1;
     host->host_class = static_cast<jclass>(env->NewGlobalRef(host_class));
-    // After a failed call an exception is pending, and NewGlobalRef is not allowed.
+    // If the first call failed, an exception is pending, and NewGlobalRef must not be called again.
     if (host->host_class != nullptr && obj != nullptr) host->object = env->NewGlobalRef(obj);
     if (host->host_class == nullptr || (obj != nullptr && host->object == nullptr)) {
         delete_host(env, host);
@@ -134,15 +135,15 @@ host_refs *make_host(JNIEnv *env, jclass host_class, jobject obj) {
 
 // ---- init ----
 
-// Looks up the event method in the class and stores it. Null, with an exception pending, if it is
-// missing.
+// Looks up the event method in the class and stores it. Returns null, with an exception pending, if
+// the class has no such method.
 jmethodID find_post_event(JNIEnv *env, jclass host_class) {
     jmethodID method = env->GetStaticMethodID(host_class, kPostEvent, kPostEventSignature);
     if (method != nullptr) store_pointer(&post_event, method);
     return method;
 }
 
-// False, with the exception cleared, if the class or its event method is missing.
+// Returns false, with the exception cleared, if the class or its event method is missing.
 bool look_up_host(JNIEnv *env) {
     jclass host_class = env->FindClass(kHostClass);
     const bool found = host_class != nullptr && find_post_event(env, host_class) != nullptr;
@@ -151,7 +152,7 @@ bool look_up_host(JNIEnv *env) {
     return found;
 }
 
-// Under the lock. The characters are read only during the call.
+// Called with the lock held. The path is read only during the call.
 TAVO_CTX *create_instance(const char *path, jint mode, int32_t *err) {
     init_param.path = path;
     init_param.mode = mode;
@@ -160,7 +161,8 @@ TAVO_CTX *create_instance(const char *path, jint mode, int32_t *err) {
     return ctx;
 }
 
-// Under the lock. Stores the handle last: analyze, which takes no lock, may use it at once.
+// Called with the lock held. Stores the handle last, because analyze, which takes no lock, may use
+// it at once.
 jint adopt_instance(JNIEnv *env, TAVO_CTX *ctx) {
     if (!look_up_host(env)) {
         tavo_deinit(ctx);
@@ -181,7 +183,7 @@ jint init_failed(jint code) {
     return code;
 }
 
-// Under the lock. chars: of path, or null; given back here.
+// Called with the lock held. chars: the characters of path, or null; released here.
 jint init_locked(JNIEnv *env, jstring path, const char *chars, jint mode) {
     const bool is_open = load_pointer(&instance) != nullptr;
     int32_t err = TAVO_ERR_HANDLE;
@@ -219,7 +221,7 @@ jint deinit_locked() {
 
 // ---- events ----
 
-// The type of the environment in AttachCurrentThread differs between the headers of JDK and NDK.
+// AttachCurrentThread has different parameter types in the headers of the JDK and the NDK.
 template <typename Vm, typename Env>
 jint attach_thread(Vm *vm, jint (Vm::*attach)(Env **, void *), JNIEnv **env) {
     Env *attached = nullptr;
@@ -228,10 +230,10 @@ jint attach_thread(Vm *vm, jint (Vm::*attach)(Env **, void *), JNIEnv **env) {
     return result;
 }
 
-// The environment of this thread, which is attached if necessary. Null if that fails.
+// Returns the environment of this thread, which is attached if necessary. Null on failure.
 JNIEnv *environment(JavaVM *vm, bool *attached_here) {
-    void *known = nullptr;
-    if (vm->GetEnv(&known, JNI_VERSION_1_6) == JNI_OK) return static_cast<JNIEnv *>(known);
+    void *current = nullptr;
+    if (vm->GetEnv(&current, JNI_VERSION_1_6) == JNI_OK) return static_cast<JNIEnv *>(current);
     JNIEnv *env = nullptr;
     *attached_here = attach_thread(vm, &JavaVM::AttachCurrentThread, &env) == JNI_OK;
     return *attached_here ? env : nullptr;
@@ -242,7 +244,8 @@ void notification_failed(JNIEnv *env) {
     env->ExceptionClear();
 }
 
-// A local reference; null, with the exception cleared, if the virtual machine is out of memory.
+// Returns a local reference; null, with the exception cleared, if the virtual machine is out of
+// memory.
 jfloatArray copy_beats(JNIEnv *env, const TAVO_INFO *info) {
     jfloatArray beats = env->NewFloatArray(info->beat_count);
     if (beats == nullptr) {
@@ -257,12 +260,13 @@ void post(JNIEnv *env, const host_refs *host, jmethodID method, const TAVO_INFO 
     const bool has_beats = info->status == 0 && info->beat_count >= 1;
     jfloatArray beats = has_beats ? copy_beats(env, info) : nullptr;
     const bool failed = info->status != 0 || (has_beats && beats == nullptr);
-    const jint what = failed ? kEventFailure : kEventResult;
+    const jint event = failed ? kEventFailure : kEventResult;
     const jint count = beats != nullptr ? info->beat_count : 0;
 
-    env->CallStaticVoidMethod(host->host_class, method, host->object, what, info->hl_pos, count,
+    env->CallStaticVoidMethod(host->host_class, method, host->object, event, info->hl_pos, count,
                               beats);
-    // The thread may have been attached before and live on: leave it no local reference.
+    // The thread may have been attached before and go on afterwards, so no local reference may be
+    // left.
     if (beats != nullptr) env->DeleteLocalRef(beats);
     if (env->ExceptionCheck() == JNI_TRUE) notification_failed(env);
 }
@@ -285,9 +289,9 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobje
         env->ExceptionClear();
         return;
     }
-    host_refs *host = make_host(env, host_class, obj);
+    host_refs *host = create_host(env, host_class, obj);
     env->DeleteLocalRef(host_class);
-    if (host == nullptr) {  // out of memory: the earlier host stays
+    if (host == nullptr) {  // out of memory: the earlier references stay
         env->ExceptionClear();
         return;
     }
@@ -295,14 +299,14 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobje
     host_refs *replaced = current_host;
     current_host = host;
     pthread_mutex_unlock(&host_mutex);
-    drop_host(env, replaced);
+    release_host(env, replaced);
 }
 
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject /*thiz*/, jstring path,
                                                      jint mode) {
     const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
     if (chars == nullptr) env->ExceptionClear();
-    // Inside an event: a deinit that waits for this thread may hold the lock.
+    // Inside an event the lock may be held by a deinit that waits for this thread.
     const bool takes_lock = !is_posting() || load_pointer(&instance) == nullptr;
     pthread_mutex_t *mutex = takes_lock ? lock_for_init() : nullptr;
     const jint result = init_locked(env, path, chars, mode);
@@ -361,18 +365,19 @@ void tavocallback(TAVO_INFO *info) {
                             "Failed to get the environment using AttachCurrentThread()");
         return;
     }
-    host_refs *host = hold_host();
+    host_refs *host = acquire_host();
     jmethodID method = load_pointer(&post_event);
     if (method == nullptr && host != nullptr) method = find_post_event(env, host->host_class);
     if (method != nullptr && host != nullptr) {
         mark_posting(pthread_self());
         post(env, host, method, info);
         mark_posting({});
-    } else {  // no class stored, or one without the method
+    } else {  // no class is stored, or it has no event method
         notification_failed(env);
     }
-    drop_host(env, host);
-    // A thread that ends attached aborts Android's runtime and keeps a desktop one from exiting.
+    release_host(env, host);
+    // A thread that ends while attached aborts Android's runtime and keeps a desktop one from
+    // exiting.
     if (attached_here) vm->DetachCurrentThread();
 }
 }

@@ -1,8 +1,8 @@
 // Stage 8: the Java bridge.
 //
-// In: the native methods of com.kestu.tavo.Tavo, for one instance in a process. Out: one call of
-// the class's static postEventFromNative per job, on the job's worker thread. Before:
-// include/tavo.h. After: java/com/kestu/tavo/Tavo.java.
+// In: the native methods of com.kestu.tavo.Tavo, for one instance per process. Out: one call of the
+// class's static postEventFromNative per job, on the job's worker thread. Before: include/tavo.h.
+// After: java/com/kestu/tavo/Tavo.java.
 #ifndef TAVO_JNI_TAVO_JNI_H
 #define TAVO_JNI_TAVO_JNI_H
 
@@ -17,44 +17,44 @@ extern "C" {
 // destroyed.
 extern pthread_mutex_t *tavo_jni_mutex;
 
-// Stores the virtual machine. Returns JNI_VERSION_1_6, or JNI_ERR (-1) if the machine does not
-// support it.
+// Stores the virtual machine. Returns JNI_VERSION_1_6; JNI_ERR (-1) if the machine does not support
+// it.
 JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *vm, void *reserved);
 
-// Stores global references to the class of thiz and to obj, the first argument of every event, and
-// deletes those of an earlier call. Nothing is changed on failure.
+// Stores global references to the class of thiz and to obj, the first argument of every event.
+// Deletes those of an earlier call. Changes nothing on failure.
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobject thiz,
                                                               jobject obj);
 
-// Returns TAVO_OK; TAVO_ERR_BUSY an instance exists, whatever the path (nothing is changed);
-// TAVO_ERR_MEMORY; TAVO_ERR_HANDLE the path is null, the file cannot be used, or the class has no
-// postEventFromNative. No instance remains after a failure.
+// Returns TAVO_OK; TAVO_ERR_BUSY if an instance exists, whatever the path, with nothing changed;
+// TAVO_ERR_MEMORY; TAVO_ERR_HANDLE if the path is null, the file cannot be used, or the class has
+// no postEventFromNative. After a failure no instance exists.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject thiz, jstring path,
                                                      jint mode);
 
-// Takes no lock: the host calls it from the thread that calls init and deinit.
-// Returns 0 started, or nothing done without an instance; -1 not started.
+// Takes no lock; the host calls it on the thread that calls init and deinit. Returns 0 if the job
+// was started or no instance exists; -1 if it was not started.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *env, jobject thiz, jint hl_param,
                                                         jint max_beats, jint beat_param2);
 
-// Stops a running job and waits until its event has returned.
-// Returns 0 released, or nothing done without an instance; -1 called from inside the event (nothing
-// is changed).
+// Stops a running job and waits until its event has returned. Returns 0 if the instance was
+// released or did not exist; -1 inside the event, with nothing changed.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *env, jobject thiz);
 
-// Static: sets fnamedec (include/tavo.h) to an empty path, so that no click track is written.
+// Static. Sets fnamedec (include/tavo.h) to an empty path, so that no click track is written.
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *env, jclass host);
 
 // True if the job of the open instance decoded the file to its end (tavo_is_complete).
 JNIEXPORT jboolean JNICALL Java_com_kestu_tavo_Tavo_isComplete(JNIEnv *env, jobject thiz);
 
-// Static: why a file cannot be analysed, in words (tavo_probe), or null if it can.
+// Static. Returns the reason why a file cannot be analysed (tavo_probe) in words, or null if it
+// can.
 JNIEXPORT jstring JNICALL Java_com_kestu_tavo_Tavo_reason(JNIEnv *env, jclass host, jstring path);
 
 // The callback of the bridge's instances. Posts exactly one event: (object, 1, hl_pos, beat_count,
 // float[beat_count] or null) for a result, (object, 2, hl_pos, 0, null) for a failure. If the
-// virtual machine has no memory for the array, a result becomes a failure. A thread that is not
-// attached is attached for the call. Before init it looks the method up in the stored class.
+// virtual machine has no memory for the array, a result becomes a failure. Attaches the thread for
+// the call if necessary. Before init it looks up the method in the stored class.
 void tavocallback(TAVO_INFO *info);
 }
 
