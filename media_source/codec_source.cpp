@@ -6,7 +6,7 @@
 
 namespace {
 
-// State of one call of get_frm.
+// State of one call of codec_source_get_frm.
 struct decoding {
     const codec_source *source;
     wexa_output output;
@@ -18,22 +18,22 @@ void *stream_of(const codec_source &source, const mtsrc_ctx *src) {
     return source.container->close_stream != nullptr ? src->dstream : src->demux;
 }
 
-// Byte counts come from another binary: an impossible one ends the call.
-bool is_possible(int32_t bytes, int32_t room) {
-    return bytes >= 0 && bytes <= room;
+// Checks a byte count of the codec library, which is another binary.
+bool is_possible(int32_t bytes, int32_t capacity) {
+    return bytes >= 0 && bytes <= capacity;
 }
 
-// Queues the PCM of the frame decoded last.
+// Queues the PCM of the last decoded frame.
 int32_t queue_decoded(mtsrc_ctx *src, const decoding &call, int64_t first) {
     const int32_t bytes = call.output.bytes;
     if (!is_possible(bytes, src->q_room + call.source->codec->spare_bytes)) return TAVO_ERR_READ;
-    const int32_t kept = call.source->reduce(src, bytes, first);
-    if (kept > src->q_room) return TAVO_ERR_READ;
-    pcm_queue_push(src, kept);
+    const int32_t mono_bytes = call.source->reduce(src, bytes, first);
+    if (mono_bytes > src->q_room) return TAVO_ERR_READ;
+    pcm_queue_push(src, mono_bytes);
     return TAVO_OK;
 }
 
-// One frame from the container through the decoder into the queue.
+// Reads one compressed frame, decodes it and queues its PCM.
 int32_t fill_step(mtsrc_ctx *src, uint8_t *frame_buf, void *work) {
     auto *call = static_cast<decoding *>(work);
     const codec_ops *codec = call->source->codec;
@@ -64,7 +64,7 @@ void free_buffer(void **buffer) {
     *buffer = nullptr;
 }
 
-// The record itself stays the codec library's.
+// Frees the buffers only; the codec library owns the record.
 void free_tag_buffers(wexa_tags *tags) {
     for (wexa_tag_text &text : tags->text) free_buffer(&text.data);
     for (wexa_tag_entry &entry : tags->entry) {
@@ -83,11 +83,11 @@ int32_t codec_source_first_audio(const int32_t *kinds, int32_t count) {
     return -1;
 }
 
-int32_t codec_source_keep_first(const mtsrc_ctx *src, int32_t bytes, int64_t /*first*/) {
+int32_t codec_source_reduce_to_first(const mtsrc_ctx *src, int32_t bytes, int64_t /*first*/) {
     return pcm_first_channel(src->q_wr, src->q_wr, bytes, src->format.channels);
 }
 
-int32_t codec_source_keep_all(const mtsrc_ctx * /*src*/, int32_t bytes, int64_t /*first*/) {
+int32_t codec_source_reduce_none(const mtsrc_ctx * /*src*/, int32_t bytes, int64_t /*first*/) {
     return bytes;
 }
 
@@ -101,8 +101,8 @@ int32_t codec_source_begin_open(mtsrc_ctx *src, int32_t (*init)()) {
     return TAVO_OK;
 }
 
-int32_t codec_source_use(mtsrc_ctx *src, const codec_ops &codec, void *decoder,
-                         const mtsrc_format &format) {
+int32_t codec_source_set_decoder(mtsrc_ctx *src, const codec_ops &codec, void *decoder,
+                                 const mtsrc_format &format) {
     src->decoder = decoder;
     if (decoder == nullptr) return TAVO_ERR_CODEC;
     src->frm_buf_size = codec.frame_bytes;

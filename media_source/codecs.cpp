@@ -22,15 +22,18 @@ const codec_ops kMpegCodec = {
     xmp123d_delete,  // remove
 };
 
-int32_t use_aac_codec(mtsrc_ctx *src, int32_t sample_rate, int32_t channels, int64_t duration) {
+int32_t create_aac_decoder(mtsrc_ctx *src, int32_t sample_rate, int32_t channels,
+                           int64_t duration) {
     const xaac_config config = {{1, kReducedChannels, 2, 0}, 3, sample_rate, channels, 0};
-    return codec_source_use(src, kAacCodec, xaacd_create(&config, nullptr),
-                            {sample_rate, kReducedChannels, kBitsPerSample, duration});
+    return codec_source_set_decoder(src, kAacCodec, xaacd_create(&config, nullptr),
+                                    {sample_rate, kReducedChannels, kBitsPerSample, duration});
 }
 
-int32_t use_mpeg_codec(mtsrc_ctx *src, int32_t sample_rate, int32_t channels, int64_t duration) {
+int32_t create_mpeg_decoder(mtsrc_ctx *src, int32_t sample_rate, int32_t channels,
+                            int64_t duration) {
     const wexa_config config = {1, 0, 2, 0};
-    const int32_t code = codec_source_use(src, kMpegCodec, xmp123d_create(&config, nullptr),
-                                          {sample_rate, channels, kBitsPerSample, duration});
+    const int32_t code =
+        codec_source_set_decoder(src, kMpegCodec, xmp123d_create(&config, nullptr),
+                                 {sample_rate, channels, kBitsPerSample, duration});
     return code == TAVO_OK && channels <= 0 ? TAVO_ERR_FORMAT : code;
 }

@@ -10,8 +10,9 @@ extern const codec_ops kAacCodec;
 extern const codec_ops kMpegCodec;
 
 // Creates the decoder. sample_rate: Hz; duration: 100-ns units. Returns 0; TAVO_ERR_CODEC no
-// decoder, TAVO_ERR_FORMAT a rate that is not accepted or, for MPEG, no channels.
-int32_t use_aac_codec(mtsrc_ctx *src, int32_t sample_rate, int32_t channels, int64_t duration);
-int32_t use_mpeg_codec(mtsrc_ctx *src, int32_t sample_rate, int32_t channels, int64_t duration);
+// decoder; TAVO_ERR_FORMAT sample rate not supported or, for MPEG, no channels.
+int32_t create_aac_decoder(mtsrc_ctx *src, int32_t sample_rate, int32_t channels, int64_t duration);
+int32_t create_mpeg_decoder(mtsrc_ctx *src, int32_t sample_rate, int32_t channels,
+                            int64_t duration);
 
 #endif

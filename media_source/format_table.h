@@ -1,4 +1,4 @@
-// Maps a type code of recognition to its format source. Called by the frame, mtsrc.cpp.
+// Maps a type code of recognition to its format source. Called by mtsrc.cpp.
 #ifndef TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
 #define TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
 
@@ -13,7 +13,7 @@ struct format_ops {
     int32_t (*reset)(mtsrc_ctx *src);
 };
 
-// Null for a type that no source serves.
+// Returns null for a type without a format source.
 const format_ops *format_ops_of(int32_t type);
 
 #endif

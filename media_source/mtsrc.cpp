@@ -15,12 +15,12 @@ bool is_open(const mtsrc_ctx *src) {
     return src != nullptr && memcmp(&src->mark, kMark, sizeof src->mark) == 0;
 }
 
-// A handle with its queue and lock; null when memory runs out.
+// Allocates a handle with its queue and lock. Null if memory runs out.
 mtsrc_ctx *new_handle(const mtsrc_io *io) {
     auto *src = static_cast<mtsrc_ctx *>(calloc(1, sizeof(mtsrc_ctx)));
     if (src == nullptr) return nullptr;
     src->q_cap = kQueueBytes;
-    // Zeroed: bytes that count but hold no sample are delivered as well.
+    // Zeroed, because a byte count may include an incomplete last sample, which is not written.
     src->q_base = static_cast<uint8_t *>(calloc(1, kQueueBytes + kQueueSpareBytes));
     if (src->q_base == nullptr || pthread_mutex_init(&src->lock, nullptr) != 0) {
         free(src->q_base);
@@ -53,7 +53,7 @@ int32_t choose_source(mtsrc_ctx *src) {
     return TAVO_OK;
 }
 
-// A handle whose opening failed; its path stays the caller's.
+// Releases a handle whose open failed. The caller keeps the path.
 void discard(mtsrc_ctx *src) {
     pthread_mutex_destroy(&src->lock);
     if (src->close != nullptr) src->close(src);
@@ -108,7 +108,7 @@ mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t /*flags*/, int32_t *err) 
 
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt) {
     if (!is_open(src) || fmt == nullptr) return TAVO_ERR_HANDLE;
-    // Field by field: the gap after bits belongs to the caller.
+    // Copied field by field, because the padding after bits belongs to the caller.
     fmt->sample_rate = src->format.sample_rate;
     fmt->channels = src->format.channels;
     fmt->bits = src->format.bits;

@@ -1,9 +1,9 @@
 /// @file
-/// Stage 1: turns an audio file into a stream of 16-bit mono PCM bytes that is read in requests of
-/// any size and positioned by time.
+/// Stage 1: turns an audio file into a stream of 16-bit mono PCM. The caller reads it in requests
+/// of any size and seeks by time.
 ///
-/// In: a path. Out: PCM at the stream's own rate, native byte order. Called by pcm/decode.h.
-/// A source is used by one thread at a time; different sources share nothing.
+/// In: a path. Out: PCM at the stream's own rate, native byte order. Called by pcm/decode.h. A
+/// source is used by one thread at a time; different sources share nothing.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_H
 #define TAVO_MEDIA_SOURCE_MTSRC_H
 
@@ -11,31 +11,31 @@
 
 struct mtsrc_ctx;  // the handle
 
-/// What mtsrc_init reads.
+/// Argument of mtsrc_init.
 struct mtsrc_param {
     const char *path;  ///< NUL-terminated, at most 511 bytes; copied
 };
 
-/// The stream that a source delivers.
+/// Format of the stream that a source delivers.
 struct mtsrc_format {
     int32_t sample_rate;  ///< Hz
-    int32_t channels;     ///< of the decoder's output; the PCM delivered always has one
+    int32_t channels;     ///< of the decoder's output; the delivered PCM always has one
     int32_t bits;         ///< 16
     int64_t duration;     ///< 100-ns units
 };
 static_assert(offsetof(mtsrc_format, duration) == 16);
 
-/// The caller's request.
+/// A read request.
 struct mtsrc_frame {
     void *data;    ///< buffer for the bytes requested
     int32_t size;  ///< receives the bytes delivered
 };
 
-// Results besides 0 and the negative codes of tavo.h.
-constexpr int32_t kMtsrcEndOfStream = 1;  ///< mtsrc_getstream: the bytes left were delivered
-constexpr int32_t kMtsrcDone = -5;        ///< mtsrc_reset and mtsrc_deinit did their work
+// Results other than 0 and the negative codes of tavo.h.
+constexpr int32_t kMtsrcEndOfStream = 1;  ///< mtsrc_getstream: delivered what was left
+constexpr int32_t kMtsrcDone = -5;        ///< success of mtsrc_reset and mtsrc_deinit
 
-// Type codes of recognition.
+// Type codes returned by recognition.
 constexpr int32_t kMtsrcTypeMp4 = 2000;        ///< MP4
 constexpr int32_t kMtsrcTypeAsf = 2002;        ///< ASF, which no source reads
 constexpr int32_t kMtsrcTypeOgg = 2005;        ///< Ogg
@@ -45,31 +45,31 @@ constexpr int32_t kMtsrcTypeMpegLayer1 = 303;  ///< MPEG audio Layer I
 constexpr int32_t kMtsrcTypeMpegLayer2 = 304;  ///< MPEG audio Layer II
 constexpr int32_t kMtsrcTypeMpegLayer3 = 305;  ///< MPEG audio Layer III
 constexpr int32_t kMtsrcTypeFlac = 322;        ///< FLAC
-constexpr int32_t kMtsrcTypeUnknown = 2199;    ///< nothing fits
+constexpr int32_t kMtsrcTypeUnknown = 2199;    ///< none of the above
 
 extern "C" {
 
-/// Opens the file. Returns a handle, the caller's until mtsrc_deinit, with *err 0; or null with
-/// *err -2 out of memory, -3 unknown or refused format or path too long, -4 no path, -6 cannot be
-/// read for recognition (shorter than 16 bytes), -7 cannot be opened or no usable audio, -255 the
-/// codec library.
+/// Opens the file. Returns a handle, which the caller releases with mtsrc_deinit, with *err 0. On
+/// failure returns null with *err -2 out of memory; -3 unknown or unsupported format, or path too
+/// long; -4 no path; -6 cannot be read for recognition (shorter than 16 bytes); -7 cannot be opened
+/// or no usable audio; -255 codec library.
 mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err);
 
-/// The same for a caller's own callback record, which is copied. On success the handle owns
-/// io->path and releases it with free; on failure the path stays the caller's. flags: not used, 0.
+/// Opens a file through the caller's callbacks, which are copied. On success the handle owns
+/// io->path and releases it with free; on failure the caller still owns it. flags: not used, 0.
 mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t flags, int32_t *err);
 
 /// Returns 0; -4 bad handle or null fmt.
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt);
 
-/// Moves to position (100-ns units). reached is handed to the reader, which stores the position
-/// where reading resumes; set *reached before the call in case the reader leaves it alone. Returns
-/// 0; -4 bad handle or failed seek, after which the queue is empty.
+/// Seeks to position (100-ns units). The reader stores in *reached where reading resumes. Set
+/// *reached before the call, because a reader may leave it unchanged. Returns 0; -4 bad handle or
+/// failed seek, after which the queue is empty.
 int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached);
 
-/// Delivers want bytes; a request of up to 917,506 bytes always fits the queue. Returns 0 exactly
-/// want bytes; 1 end of stream, the bytes left; -2 out of memory; -4 bad handle or frame, want
-/// negative or more than the queue can hold; -6 read or decode failure.
+/// Delivers want bytes; up to 917,506 bytes always fit the queue. Returns 0 if it delivered exactly
+/// want bytes; 1 if the stream ended, with the remaining bytes delivered; -2 out of memory; -4 bad
+/// handle or frame, or want negative or greater than the queue can hold; -6 read or decode failure.
 int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
 
 /// Empties the queue and resets the decoder. Returns -5 (done); -4 bad handle.
@@ -78,13 +78,13 @@ int32_t mtsrc_reset(mtsrc_ctx *src);
 /// Releases everything. Returns -5 (done); -4 bad handle.
 int32_t mtsrc_deinit(mtsrc_ctx *src);
 
-/// Recognises an open file by its content. Returns 0 with *type set (kMtsrcTypeUnknown when nothing
-/// fits) and the file offset where it was; -6 when 16 bytes cannot be read.
+/// Recognises an open file by its content and restores the file offset. Returns 0 with *type set,
+/// kMtsrcTypeUnknown if no probe matches; -6 if 16 bytes cannot be read.
 int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type);
 
-/// The probes, in the order of their calls. head: the first 16 bytes of the file, whose offset
-/// may be any and is restored. A probe uses only read, tell, seek and skip of io. Returns a type
-/// code.
+/// The probes, in the order in which they are called. head: the first 16 bytes of the file. They
+/// restore the file offset, whatever it is, and use only read, tell, seek and skip of io. Return a
+/// type code.
 /// @{
 int32_t mtsrc_probe_asf(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 int32_t mtsrc_probe_mp4(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);

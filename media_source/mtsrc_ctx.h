@@ -1,6 +1,6 @@
-// The source handle, known only to the frame (mtsrc.cpp) and the format sources.
+// The source handle. Only mtsrc.cpp and the format sources know its fields.
 //
-// The frame allocates it, recognises the file and calls the format through the five operations.
+// mtsrc.cpp allocates it, recognises the file and calls the format through the five operations.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_CTX_H
 #define TAVO_MEDIA_SOURCE_MTSRC_CTX_H
 
@@ -9,40 +9,40 @@
 #include "include/tavo.h"
 #include "media_source/mtsrc.h"
 
-constexpr int32_t kQueueBytes = 1'048'576;  // of q_cap
-// Allocated after the queue's q_cap bytes: the largest FLAC block decodes to 262,140 bytes, of
-// which half are left in one channel, and q_room exceeds 131,070 before each frame.
+constexpr int32_t kQueueBytes = 1'048'576;  // q_cap
+// Allocated after the queue's q_cap bytes. The largest FLAC block decodes to 262,140 bytes, half of
+// which remain in one channel; q_room exceeds 131,070 before each frame.
 constexpr int32_t kQueueSpareBytes = 131'070;
 
-// Codec codes of the codec library. Its decoders get them in every frame record.
+// Codec codes of the codec library. Every frame record passes one to its decoder.
 constexpr int32_t kCodecMpeg = 305;
 constexpr int32_t kCodecAac = 306;
 constexpr int32_t kCodecFlac = 322;
 constexpr int32_t kCodecVorbis = 323;
 
-// The queue holds 16-bit mono PCM. q_base <= q_rd <= q_wr; q_fill = q_wr - q_rd;
-// q_room = q_cap - (q_wr - q_base).
+// The queue holds 16-bit mono PCM. q_base <= q_rd <= q_wr; q_fill = q_wr - q_rd; q_room = q_cap -
+// (q_wr - q_base).
 struct mtsrc_ctx {
-    uint32_t mark;  // "KOVA" in memory order once the source is open
+    uint32_t mark;  // "KOVA" in memory order when the source is open
     int32_t (*open)(mtsrc_ctx *src);
     void (*close)(mtsrc_ctx *src);
     int32_t (*get_frm)(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
     int32_t (*seek)(mtsrc_ctx *src, int64_t position, int64_t *reached);
     int32_t (*reset)(mtsrc_ctx *src);
     mtsrc_io io;             // the path buffer is owned
-    mtsrc_file *probe_file;  // opened for recognition, kept to the end, owned
+    mtsrc_file *probe_file;  // opened for recognition, stays open, owned
     mtsrc_format format;
-    int32_t codec;    // the type code, then the stream's codec code
+    int32_t codec;    // the type code; after the open, the stream's codec code
     void *demux;      // reader or demuxer, owned
     void *dstream;    // demuxer's stream (MP4, Ogg), owned
     void *decoder;    // owned; null for WAV
     uint8_t *q_base;  // [q_cap + kQueueSpareBytes] owned
     int32_t q_cap;    // bytes
-    int32_t q_fill;   // bytes held
+    int32_t q_fill;   // bytes in the queue
     int32_t q_room;   // bytes free after q_wr
     uint8_t *q_rd;
     uint8_t *q_wr;
-    int32_t frm_buf_size;  // bytes of one compressed frame's buffer
+    int32_t frm_buf_size;  // size of the buffer for one compressed frame, bytes
     pthread_mutex_t lock;  // held by reset and deinit
 };
 static_assert(sizeof(void *) != 8 ||
@@ -53,10 +53,10 @@ static_assert(sizeof(void *) != 8 || offsetof(mtsrc_ctx, lock) == 280);
 
 extern "C" {
 
-// The five operations of each format source. open creates reader and decoder, fills the handle and
-// returns 0, TAVO_ERR_HANDLE, TAVO_ERR_FORMAT, TAVO_ERR_OPEN or TAVO_ERR_CODEC. close accepts a
-// handle whose open failed. The other three are the bodies of mtsrc_getstream, mtsrc_seekstream and
-// mtsrc_reset; reset returns 0.
+// The five operations of each format source. open creates the reader and the decoder, fills the
+// handle and returns 0, TAVO_ERR_HANDLE, TAVO_ERR_FORMAT, TAVO_ERR_OPEN or TAVO_ERR_CODEC. close
+// accepts a handle whose open failed. get_frm, seek and reset are the bodies of mtsrc_getstream,
+// mtsrc_seekstream and mtsrc_reset; reset returns 0.
 int32_t mtsource_wav_open(mtsrc_ctx *src);
 void mtsource_wav_close(mtsrc_ctx *src);
 int32_t mtsource_wav_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
@@ -93,10 +93,11 @@ int32_t mtsource_ogg_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
 int32_t mtsource_ogg_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
 int32_t mtsource_ogg_reset(mtsrc_ctx *src);
 
-// Sample rate (Hz) that the decoder reports for the next frame, which is consumed; -1 on failure.
+// Consumes the next compressed frame and returns the sample rate (Hz) that the decoder reports for
+// it; -1 on failure.
 int32_t aac_get_hz(void *reader, void *decoder);
 
-// Index of the first audio track or stream, -1 without one. info: an xmp4_info or an xogg_info.
+// Index of the first audio track or stream, or -1. info: an xmp4_info or an xogg_info.
 int32_t get_mp4_audiostream(const void *info);
 int32_t get_ogg_audiostream(const void *info);
 }

@@ -1,5 +1,5 @@
 /// @file
-/// File access of stage 1: the callbacks that a media source hands to the format probes and to the
+/// File access of stage 1: callbacks that a media source passes to the format probes and to the
 /// codec library, which opens and reads the file through them. Another binary reads this record, so
 /// its layout is fixed.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_IO_H
@@ -10,12 +10,12 @@
 
 struct mtsrc_io;
 
-/// A file as the callbacks see it: a heap cell made by open, freed by close.
+/// An open file. open allocates it, close frees it.
 struct mtsrc_file {
-    int32_t fd;  ///< -1: none
+    int32_t fd;  ///< -1 if not open
 };
 
-/// The callbacks and what they work on.
+/// The callbacks and their arguments.
 struct mtsrc_io {
     mtsrc_file *(*open)(const mtsrc_io *io, int32_t mode);        ///< bit 0 of mode: read-write
     int32_t (*close)(mtsrc_file *file);                           ///< 0 or -1
@@ -24,8 +24,8 @@ struct mtsrc_io {
     int32_t (*tell)(mtsrc_file *file, int64_t *offset);                  ///< 0 or -1
     int32_t (*seek)(mtsrc_file *file, const int64_t *offset);            ///< absolute; 0 or -1
     int32_t (*skip)(mtsrc_file *file, const int64_t *distance);          ///< forward, >= 1; 0 or -1
-    int32_t (*size)(mtsrc_file *file, int64_t *length);                  ///< offset kept; 0 or -1
-    uint64_t reserved_64;                                                ///< 0
+    int32_t (*size)(mtsrc_file *file, int64_t *length);  ///< offset unchanged; 0 or -1
+    uint64_t reserved_64;                                ///< 0
     int32_t fd;               ///< descriptor to duplicate when path is "fd"
     int32_t reserved_76;      ///< 0
     uint64_t reserved_80;     ///< 0
@@ -38,13 +38,13 @@ static_assert(sizeof(void *) != 8 || (offsetof(mtsrc_io, path) == 88 && sizeof(m
 
 extern "C" {
 
-/// Opens io->path (or duplicates io->fd when the path is "fd") at offset 0. Returns a new handle,
+/// Opens io->path (or duplicates io->fd if the path is "fd") at offset 0. Returns a new handle, or
 /// null on failure. mode bit 0: 0 read-only, 1 read-write, created with permissions 0644.
 mtsrc_file *mtsrc_file_open(const mtsrc_io *io, int32_t mode);
 
-/// A callback on a file of mtsrc_file_open, as the field of the same name in mtsrc_io. Reading and
-/// writing are one system call, repeated only when a signal interrupts it: fewer bytes than count
-/// are no failure and no end.
+/// Callbacks for files of mtsrc_file_open; see the field of the same name in mtsrc_io. A read or
+/// write is one system call, repeated only if a signal interrupts it. It may transfer fewer bytes
+/// than count.
 /// @{
 int32_t mtsrc_file_close(mtsrc_file *file);
 int64_t mtsrc_file_read(mtsrc_file *file, void *buf, int32_t count);
@@ -56,7 +56,7 @@ int32_t mtsrc_file_size(mtsrc_file *file, int64_t *length);
 /// @}
 }
 
-/// Sets the eight callbacks of *io to the functions above and leaves its other fields alone.
+/// Sets the eight callbacks of *io to the functions above. Leaves its other fields unchanged.
 inline void mtsrc_file_callbacks(mtsrc_io *io) {
     io->open = mtsrc_file_open;
     io->close = mtsrc_file_close;

@@ -6,10 +6,10 @@
 namespace {
 
 constexpr int32_t kBytesPerSample = 2;
-// In a row: more than four days of MPEG frames. A reader that adds nothing for longer never will.
+// Consecutive empty steps before giving up: more than four days of MPEG frames.
 constexpr int32_t kMaxEmptySteps = 16'777'216;
 
-void make_room(mtsrc_ctx *src) {
+void compact_queue(mtsrc_ctx *src) {
     memmove(src->q_base, src->q_rd, static_cast<size_t>(src->q_fill));
     src->q_rd = src->q_base;
     src->q_wr = src->q_base + src->q_fill;
@@ -23,35 +23,36 @@ void deliver(mtsrc_ctx *src, int32_t bytes, mtsrc_frame *frame) {
     src->q_fill -= bytes;
 }
 
-// Returns 0 with want bytes held, else the code that ends the call.
-int32_t fill_to(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill &fill) {
+// Returns 0 if the queue holds want bytes, otherwise the code that ends the call.
+int32_t fill_queue(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill &fill) {
     int32_t empty_steps = 0;
     while (src->q_fill < want) {
         if (src->q_room <= src->frm_buf_size) {
-            make_room(src);
+            compact_queue(src);
             if (src->q_room <= src->frm_buf_size) return TAVO_ERR_HANDLE;
         }
-        const int32_t held = src->q_fill;
+        const int32_t before = src->q_fill;
         const int32_t code = fill.step(src, frame_buf, fill.work);
         if (code != TAVO_OK) return code;
-        empty_steps = src->q_fill > held ? 0 : empty_steps + 1;
+        empty_steps = src->q_fill > before ? 0 : empty_steps + 1;
         if (empty_steps >= kMaxEmptySteps) return TAVO_ERR_READ;
     }
     return TAVO_OK;
 }
 
-constexpr int32_t kRunFrames = 64;  // reduced at once, in loops of fixed length for the vectoriser
+constexpr int32_t kChunkFrames =
+    64;  // sample frames per chunk, a fixed number so that the loops are vectorised
 
 struct left_of {
     static void reduce(const int16_t *stereo, int16_t *mono) {
-        for (int32_t j = 0; j < kRunFrames; ++j) mono[j] = stereo[2 * j];
+        for (int32_t j = 0; j < kChunkFrames; ++j) mono[j] = stereo[2 * j];
     }
     static int16_t reduce_one(const int16_t *frame) { return frame[0]; }
 };
 
 struct mean_of {
     static void reduce(const int16_t *stereo, int16_t *mono) {
-        for (int32_t j = 0; j < kRunFrames; ++j) {
+        for (int32_t j = 0; j < kChunkFrames; ++j) {
             mono[j] = static_cast<int16_t>((stereo[2 * j] + stereo[2 * j + 1]) / 2);
         }
     }
@@ -60,27 +61,27 @@ struct mean_of {
     }
 };
 
-// The body of pcm_first_channel and pcm_mean_of_two. A run is read before it is written.
+// The body of pcm_first_channel and pcm_mean_of_two. Each chunk is read before it is written.
 template <typename reduction>
-int32_t reduce_pcm(uint8_t *to, const uint8_t *from, int32_t bytes, int32_t channels) {
+int32_t reduce_pcm(uint8_t *dst, const uint8_t *pcm, int32_t bytes, int32_t channels) {
     if (channels <= 1) {
-        memmove(to, from, static_cast<size_t>(bytes));
+        memmove(dst, pcm, static_cast<size_t>(bytes));
         return bytes;
     }
     const int64_t count = bytes / kBytesPerSample / channels;
     int64_t j = 0;
-    for (; channels == 2 && j + kRunFrames <= count; j += kRunFrames) {
-        int16_t stereo[2 * kRunFrames];
-        int16_t mono[kRunFrames];
-        memcpy(stereo, from + j * 2 * kBytesPerSample, sizeof stereo);
+    for (; channels == 2 && j + kChunkFrames <= count; j += kChunkFrames) {
+        int16_t stereo[2 * kChunkFrames];
+        int16_t mono[kChunkFrames];
+        memcpy(stereo, pcm + j * 2 * kBytesPerSample, sizeof stereo);
         reduction::reduce(stereo, mono);
-        memcpy(to + j * kBytesPerSample, mono, sizeof mono);
+        memcpy(dst + j * kBytesPerSample, mono, sizeof mono);
     }
     for (; j < count; ++j) {
         int16_t frame[2];
-        memcpy(frame, from + j * channels * kBytesPerSample, sizeof frame);
+        memcpy(frame, pcm + j * channels * kBytesPerSample, sizeof frame);
         const int16_t mono = reduction::reduce_one(frame);
-        memcpy(to + j * kBytesPerSample, &mono, sizeof mono);
+        memcpy(dst + j * kBytesPerSample, &mono, sizeof mono);
     }
     return bytes / channels;
 }
@@ -104,7 +105,7 @@ int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pc
     if (frame == nullptr || frame->data == nullptr || want < 0) return TAVO_ERR_HANDLE;
     auto *frame_buf = static_cast<uint8_t *>(malloc(static_cast<size_t>(src->frm_buf_size)));
     if (frame_buf == nullptr) return TAVO_ERR_MEMORY;
-    const int32_t code = fill_to(src, want, frame_buf, fill);
+    const int32_t code = fill_queue(src, want, frame_buf, fill);
     if (code == TAVO_OK) {
         deliver(src, want, frame);
     } else if (code == kMtsrcEndOfStream) {
@@ -114,10 +115,10 @@ int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pc
     return code;
 }
 
-int32_t pcm_first_channel(uint8_t *to, const uint8_t *from, int32_t bytes, int32_t channels) {
-    return reduce_pcm<left_of>(to, from, bytes, channels);
+int32_t pcm_first_channel(uint8_t *dst, const uint8_t *pcm, int32_t bytes, int32_t channels) {
+    return reduce_pcm<left_of>(dst, pcm, bytes, channels);
 }
 
-int32_t pcm_mean_of_two(uint8_t *to, const uint8_t *from, int32_t bytes, int32_t channels) {
-    return reduce_pcm<mean_of>(to, from, bytes, channels);
+int32_t pcm_mean_of_two(uint8_t *dst, const uint8_t *pcm, int32_t bytes, int32_t channels) {
+    return reduce_pcm<mean_of>(dst, pcm, bytes, channels);
 }

@@ -1,5 +1,5 @@
-// Recognises MPEG audio: within the first 32 KiB two frame headers are exactly one frame length
-// apart.
+// Recognises MPEG audio: two frame headers within the first 32 KiB that are exactly one frame
+// length apart.
 #include <cstdlib>
 #include <cstring>
 
@@ -9,13 +9,13 @@
 namespace {
 
 constexpr int32_t kScanBytes = 32'768;
-constexpr int32_t kNextHeaderEnd = 32'764;  // a following header starts before this index
+constexpr int32_t kNextHeaderEnd = 32'764;  // the second header must start before this index
 constexpr int32_t kHeaderBytes = 4;
 constexpr int32_t kMinFrameBytes = 5;
 constexpr int64_t kTransportPacketBytes = 188;
 constexpr uint8_t kTransportSync = 0x47;
 
-// Header fields as they are stored.
+// Header fields as the file stores them.
 constexpr int32_t kVersion25 = 0;
 constexpr int32_t kVersionReserved = 1;
 constexpr int32_t kVersion1 = 3;
@@ -28,12 +28,12 @@ constexpr int32_t kTypeLessLayerBits = 306;  // minus the layer bits: the type c
 struct frame_header {
     int32_t version;
     int32_t layer;
-    int32_t bitrate;  // index, 0: free format
+    int32_t bitrate;  // index; 0 is free format
     int32_t rate;     // index
     bool padded;
 };
 
-// bytes: three. Returns false for what cannot be a header.
+// Parses the three bytes of a header. Returns false if they cannot be one.
 bool parse(const uint8_t *bytes, frame_header *header) {
     *header = {(bytes[1] >> 3) & 3, (bytes[1] >> 1) & 3, bytes[2] >> 4, (bytes[2] >> 2) & 3,
                (bytes[2] & 2) != 0};
@@ -42,7 +42,7 @@ bool parse(const uint8_t *bytes, frame_header *header) {
 }
 
 int32_t kilobits(const frame_header &header) {
-    // [MPEG-1 Layer III, II, I; MPEG-2 Layer III, II, I][index]
+    // [MPEG-1 Layer III, II, I; MPEG-2 Layer III, II, I][bitrate index]
     static constexpr int16_t kRates[6][15] = {
         {0, 32, 40, 48, 56, 64, 80, 96, 112, 128, 160, 192, 224, 256, 320},
         {0, 32, 48, 56, 64, 80, 96, 112, 128, 160, 192, 224, 256, 320, 384},
@@ -55,13 +55,13 @@ int32_t kilobits(const frame_header &header) {
 }
 
 int32_t hertz(const frame_header &header) {
-    // [version bits][index]; the reserved version has none
+    // [version bits][rate index]; the row of the reserved version is not used
     static constexpr int32_t kRates[4][3] = {
         {11025, 12000, 8000}, {0, 0, 0}, {22050, 24000, 16000}, {44100, 48000, 32000}};
     return kRates[header.version][header.rate];
 }
 
-// Bytes without padding; 0 where none is defined.
+// Bytes of a frame without padding; 0 if the layer and version have none.
 int32_t frame_length(const frame_header &header) {
     const int32_t bits = 1000 * kilobits(header);
     switch (header.layer) {
@@ -87,7 +87,7 @@ bool refill(scan *s) {
     return s->got > 0;
 }
 
-// Refills the buffer with what follows the tag at index at.
+// Refills the buffer with the bytes after the tag at index at.
 bool skip_tag(scan *s, int32_t at) {
     int64_t start = 0;
     if (s->io->tell(s->file, &start) != 0) return false;
@@ -104,7 +104,7 @@ bool skip_tag(scan *s, int32_t at) {
     return s->io->skip(s->file, &length) == 0 && refill(s);
 }
 
-// Tests the candidate header at index at. Returns the answer that ends the scan, or 0 to go on.
+// Tests the candidate header at index at. Returns a type code that ends the scan, or 0 to continue.
 int32_t try_candidate(const scan &s, int32_t at) {
     frame_header header;
     if (!parse(s.buf + at, &header)) return 0;
@@ -119,7 +119,7 @@ int32_t try_candidate(const scan &s, int32_t at) {
 
 int32_t run_scan(scan *s) {
     if (!refill(s)) return kMtsrcTypeUnknown;
-    uint32_t window = 0;  // the four bytes up to k
+    uint32_t window = 0;  // the four bytes up to index k
     for (int32_t k = 0; k < s->got; ++k) {
         window = window << 8 | s->buf[k];
         if (window >= 0x49443302 && window <= 0x49443304) {  // "ID3", version 2 to 4
@@ -128,7 +128,7 @@ int32_t run_scan(scan *s) {
             k = -1;
             continue;
         }
-        // The candidate's three bytes are those before k.
+        // The candidate header starts three bytes before k.
         const int32_t answer = k < 3 ? 0 : try_candidate(*s, k - 3);
         if (answer != 0) return answer;
     }
@@ -141,7 +141,7 @@ bool has_transport_sync(const mtsrc_io *io, mtsrc_file *file) {
     return io->seek(file, &offset) == 0 && io->read(file, &byte, 1) == 1 && byte == kTransportSync;
 }
 
-// True for the head of another kind of stream. May move the file offset.
+// True if the head belongs to another kind of stream. May move the file offset.
 bool is_other_container(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file,
                         const int64_t *start) {
     constexpr uint8_t kPackHeader[4] = {0, 0, 1, 0xBA};

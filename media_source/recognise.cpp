@@ -9,7 +9,8 @@ namespace {
 
 using probe = int32_t (*)(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 
-// In the order of their calls: cheap tests of the head first, the scan of a large block last.
+// In the order in which they are called: quick tests of the head first, the scan of a large block
+// last.
 constexpr probe kProbes[] = {mtsrc_probe_asf, mtsrc_probe_mp4, mtsrc_probe_flac, mtsrc_probe_ogg,
                              mtsrc_probe_wav, mtsrc_probe_aac, mtsrc_probe_mpeg};
 
@@ -17,10 +18,10 @@ bool is_at(const uint8_t *head, size_t at, const char *name) {
     return memcmp(head + at, name, 4) == 0;
 }
 
-// Reads count bytes after an ID3v2 tag, or at the current offset without one, and restores the
+// Reads count bytes after an ID3v2 tag, or at the current offset without a tag, and restores the
 // offset.
-bool peek_behind_tag(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file, uint8_t *bytes,
-                     int32_t count) {
+bool peek_after_tag(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file, uint8_t *bytes,
+                    int32_t count) {
     int64_t start = 0;
     if (io->tell(file, &start) != 0) return false;
     bool found = true;
@@ -65,7 +66,7 @@ int32_t mtsrc_probe_mp4(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file
 int32_t mtsrc_probe_flac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file) {
     uint8_t bytes[4];
     const bool is_flac =
-        peek_behind_tag(head, io, file, bytes, sizeof bytes) && is_at(bytes, 0, "fLaC");
+        peek_after_tag(head, io, file, bytes, sizeof bytes) && is_at(bytes, 0, "fLaC");
     return is_flac ? kMtsrcTypeFlac : kMtsrcTypeUnknown;
 }
 
@@ -84,7 +85,7 @@ int32_t mtsrc_probe_wav(const uint8_t *head, const mtsrc_io * /*io*/, mtsrc_file
 
 int32_t mtsrc_probe_aac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file) {
     uint8_t bytes[7];
-    if (!peek_behind_tag(head, io, file, bytes, sizeof bytes)) return kMtsrcTypeUnknown;
+    if (!peek_after_tag(head, io, file, bytes, sizeof bytes)) return kMtsrcTypeUnknown;
     if (is_at(bytes, 0, "ADIF")) return kMtsrcTypeAac;
     // The ADTS sync word with layer 0: either MPEG version, with or without a checksum.
     switch (bytes[0] << 8 | bytes[1]) {

@@ -12,13 +12,13 @@ constexpr container_ops kReader = {
     xaacfd_delete,   // remove
     xaac_deinit,     // deinit
 };
-constexpr codec_source kAac = {&kReader, &kAacCodec, codec_source_keep_first};
+constexpr codec_source kAac = {&kReader, &kAacCodec, codec_source_reduce_to_first};
 
 int32_t create(mtsrc_ctx *src, xaac_info *info) {
     int64_t word = 0;
     src->demux = xaacfd_create(&src->io, &word, info, nullptr);
     if (src->demux == nullptr) return TAVO_ERR_OPEN;
-    return use_aac_codec(src, info->sample_rate, info->channels, info->duration);
+    return create_aac_decoder(src, info->sample_rate, info->channels, info->duration);
 }
 
 }  // namespace

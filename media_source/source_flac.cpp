@@ -3,7 +3,7 @@
 
 namespace {
 
-// The reader looks at the flag in its own state.
+// Sets the flag in the reader's state before each read.
 int32_t get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                 int64_t *second) {
     static_cast<uint8_t *>(reader)[kFlacReaderFlag] = 1;
@@ -27,15 +27,16 @@ constexpr codec_ops kFlacCodec = {
     xflacd_reset,      // reset
     xflacd_delete,     // remove
 };
-constexpr codec_source kFlac = {&kReader, &kFlacCodec, codec_source_keep_first};
+constexpr codec_source kFlac = {&kReader, &kFlacCodec, codec_source_reduce_to_first};
 
 int32_t create(mtsrc_ctx *src, xflac_info *info) {
     int64_t word = 0;
     src->demux = xflacfd_create(&src->io, &word, info, nullptr);
     if (src->demux == nullptr) return TAVO_ERR_OPEN;
     const wexa_config config = {1, kReducedChannels, 2, 0};
-    return codec_source_use(src, kFlacCodec, xflacd_create(&config, nullptr),
-                            {info->sample_rate, kReducedChannels, kBitsPerSample, info->duration});
+    return codec_source_set_decoder(
+        src, kFlacCodec, xflacd_create(&config, nullptr),
+        {info->sample_rate, kReducedChannels, kBitsPerSample, info->duration});
 }
 
 }  // namespace

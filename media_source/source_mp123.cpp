@@ -7,17 +7,17 @@
 
 namespace {
 
-// The decoder's delay at the start of a 44.1-kHz stereo stream.
+// The decoder's delay, which is dropped at the start of a 44.1-kHz stereo stream.
 constexpr int32_t kDelayRate = 44'100;  // Hz
 constexpr int32_t kDelayChannels = 2;
 constexpr int32_t kDelayBytes = kWexaMpegDelay * kDelayChannels * 2;
 
-// The mean of the first two channels, without the delay.
+// Reduces a frame to the mean of its first two channels, without the delay.
 int32_t reduce(const mtsrc_ctx *src, int32_t bytes, int64_t first) {
     const bool delayed = src->format.channels == kDelayChannels &&
                          src->format.sample_rate == kDelayRate && first == 0;
     if (delayed) {
-        // A first frame shorter than the delay is dropped whole.
+        // A first frame that is shorter than the delay is dropped entirely.
         const int32_t dropped = std::min(bytes, kDelayBytes);
         bytes -= dropped;
         memmove(src->q_wr, src->q_wr + dropped, static_cast<size_t>(bytes));
@@ -38,7 +38,7 @@ int32_t create(mtsrc_ctx *src, xmp123_info *info) {
     int64_t word = 0;
     src->demux = xmp123fd_create(&src->io, &word, info, nullptr);
     if (src->demux == nullptr) return TAVO_ERR_OPEN;
-    return use_mpeg_codec(src, info->sample_rate, info->channels, info->duration);
+    return create_mpeg_decoder(src, info->sample_rate, info->channels, info->duration);
 }
 
 }  // namespace

@@ -1,4 +1,4 @@
-// AAC and MPEG Layer III in MP4. The codec is that of the first audio track.
+// AAC or MPEG Layer III in MP4. The first audio track determines the codec.
 #include <algorithm>
 
 #include "media_source/codecs.h"
@@ -6,7 +6,7 @@
 namespace {
 
 int32_t init() {
-    // Nothing is undone when the second fails: the frame closes the format after a failed open too.
+    // If the second call fails, the first is undone when the handle is closed.
     const int32_t result = xaac_init();
     return result != 0 ? result : xmp123_init();
 }
@@ -27,10 +27,10 @@ constexpr container_ops kMp4 = {
     xmp4fd_delete,    // remove
     deinit,           // deinit
 };
-constexpr codec_source kAacInMp4 = {&kMp4, &kAacCodec, codec_source_keep_first};
-constexpr codec_source kMpegInMp4 = {&kMp4, &kMpegCodec, codec_source_keep_first};
-// Delivers what is queued, nothing more.
-constexpr codec_source kOtherInMp4 = {&kMp4, nullptr, codec_source_keep_first};
+constexpr codec_source kAacInMp4 = {&kMp4, &kAacCodec, codec_source_reduce_to_first};
+constexpr codec_source kMpegInMp4 = {&kMp4, &kMpegCodec, codec_source_reduce_to_first};
+// Delivers only what is in the queue.
+constexpr codec_source kOtherInMp4 = {&kMp4, nullptr, codec_source_reduce_to_first};
 
 const codec_source &source_of(const mtsrc_ctx *src) {
     if (src != nullptr && src->codec == kCodecAac) return kAacInMp4;
@@ -50,9 +50,9 @@ int32_t create(mtsrc_ctx *src, xmp4_info *info) {
     xmp4fds_get_info_aud(src->dstream, &track);
     switch (track.format_tag) {
         case kWexaTagAac:
-            return use_aac_codec(src, track.sample_rate, track.channels, info->duration);
+            return create_aac_decoder(src, track.sample_rate, track.channels, info->duration);
         case kWexaTagMpegLayer3:
-            return use_mpeg_codec(src, track.sample_rate, track.channels, info->duration);
+            return create_mpeg_decoder(src, track.sample_rate, track.channels, info->duration);
         default:
             return TAVO_ERR_FORMAT;
     }

@@ -30,10 +30,10 @@ constexpr codec_ops kVorbisCodec = {
     xvorbisd_reset,   // reset
     xvorbisd_delete,  // remove
 };
-constexpr codec_source kOgg = {&kOggContainer, &kVorbisCodec, codec_source_keep_all};
+constexpr codec_source kOgg = {&kOggContainer, &kVorbisCodec, codec_source_reduce_none};
 
 // Stores the set-up data in *setup. Returns 0 or TAVO_ERR_OPEN; the caller frees setup->data.
-int32_t fetch_setup(void *stream, wexa_frame *setup) {
+int32_t read_setup(void *stream, wexa_frame *setup) {
     int32_t capacity = 0;
     if (xoggds_get_format(stream, nullptr, &capacity) != 0) return TAVO_ERR_OPEN;
     if (capacity < 0 || capacity > kMaxSetupBytes) return TAVO_ERR_OPEN;
@@ -65,12 +65,13 @@ int32_t create(mtsrc_ctx *src, xogg_info *info, wexa_frame *setup) {
     if (src->dstream == nullptr) return TAVO_ERR_OPEN;
     xogg_stream stream = {};
     if (xoggds_get_info_aud(src->dstream, &stream) != 0) return TAVO_ERR_OPEN;
-    if (fetch_setup(src->dstream, setup) != TAVO_OK) return TAVO_ERR_OPEN;
+    if (read_setup(src->dstream, setup) != TAVO_OK) return TAVO_ERR_OPEN;
     if (stream.codec != kCodecVorbis) return TAVO_ERR_OPEN;
     const int32_t code = create_decoder(src, *setup);
     if (code != TAVO_OK) return code;
-    return codec_source_use(src, kVorbisCodec, src->decoder,
-                            {stream.sample_rate, kVorbisChannels, kBitsPerSample, info->duration});
+    return codec_source_set_decoder(
+        src, kVorbisCodec, src->decoder,
+        {stream.sample_rate, kVorbisChannels, kBitsPerSample, info->duration});
 }
 
 }  // namespace

@@ -1,14 +1,13 @@
-// The contract that a codec library, libwexaaudio.so, fulfils for the format sources of stage 1:
-// readers, demuxers and frame decoders. It is the contract, not an implementation. The records are
-// read by another binary, so each offset is asserted.
+// The interface of the codec library, libwexaaudio.so: readers, demuxers and frame decoders for the
+// format sources of stage 1. It is a contract, not an implementation. Another binary reads the
+// records, so each offset is asserted.
 //
-// Every reader opens the file itself through the callbacks of mtsrc_io. Results: 0 success,
-// kWexaEndOfStream, anything else failure. Times are in 100-ns units unless noted otherwise.
-// Objects of different sources are used on different threads at once.
+// Readers open the file through the callbacks of mtsrc_io. Results: 0 success, kWexaEndOfStream,
+// anything else failure. Times are in 100-ns units unless stated otherwise. Objects of different
+// sources are used on different threads at the same time.
 //
-// A "frame" is whatever a library's own reader passes to its own decoder: compressed bytes, or PCM
-// that the reader has decoded already, which the decoder then copies. A source only carries it from
-// one to the other and depends on nothing but its byte count.
+// A "frame" is what a library's reader passes to its own decoder: compressed bytes, or PCM that the
+// reader has already decoded and the decoder copies. A source depends only on its byte count.
 #ifndef TAVO_MEDIA_SOURCE_WEXAAUDIO_H
 #define TAVO_MEDIA_SOURCE_WEXAAUDIO_H
 
@@ -18,16 +17,16 @@
 #include "media_source/mtsrc_io.h"
 
 constexpr int32_t kWexaPcm = 300;      // codec code of linear PCM
-constexpr int32_t kWexaKindAudio = 1;  // kind of a track or stream
+constexpr int32_t kWexaKindAudio = 1;  // kind of an audio track or stream
 constexpr int32_t kWexaTagAac = 0xFF;  // WAVE format tags of MP4 tracks
 constexpr int32_t kWexaTagMpegLayer3 = 0x55;
 constexpr int32_t kWexaEndOfStream = 1;  // result of a read
 // Sample pairs that the MPEG source drops at the start of a 44.1-kHz stereo stream. A reader's
-// duration and positions count what the source delivers.
+// duration and positions count only what the source delivers.
 constexpr int32_t kWexaMpegDelay = 529;
 
-// Tags of a file; a reader may give none (a null pointer). The record is the library's. The buffers
-// are allocated with malloc; the source frees them unread.
+// Tags of a file, or a null pointer. The library owns the record. Its buffers come from malloc; the
+// source frees them without reading them.
 struct wexa_tag_text {
     uint64_t reserved_0;
     void *data;
@@ -162,7 +161,7 @@ static_assert(sizeof(void *) != 8 || sizeof(xogg_stream) == 32);
 // Decoder configuration.
 struct wexa_config {
     int32_t word_0;            // 1
-    int32_t output_channels;   // 0: the stream's own
+    int32_t output_channels;   // 0: same as the stream
     int32_t bytes_per_sample;  // 2
     int32_t word_3;            // 0
 };
@@ -175,7 +174,7 @@ struct xaac_config {
 };
 static_assert(sizeof(void *) != 8 || (sizeof(wexa_config) == 16 && sizeof(xaac_config) == 32));
 
-// One frame, compressed or PCM, passed from a reader to the decoder.
+// One frame, compressed or PCM, passed from a reader to its decoder.
 struct wexa_frame {
     void *data;
     uint64_t reserved_8;
@@ -189,7 +188,7 @@ static_assert(sizeof(void *) != 8 ||
               (offsetof(wexa_frame, bytes) == 16 && offsetof(wexa_frame, codec) == 24));
 static_assert(sizeof(void *) != 8 || sizeof(wexa_frame) == 96);
 
-// What a decoder wrote: bytes of interleaved 16-bit PCM at data, which the caller sets.
+// Output of a decoder: bytes of interleaved 16-bit PCM at data, a buffer of the caller's.
 struct wexa_output {
     uint8_t reserved_0[32];
     int32_t bytes;
@@ -202,7 +201,7 @@ static_assert(sizeof(void *) != 8 ||
 static_assert(sizeof(void *) != 8 || sizeof(wexa_output) == 272);
 
 struct wexa_status {
-    int32_t produced;  // not 0 when the decode gave PCM
+    int32_t produced;  // not 0 if the decoder wrote PCM
     int32_t reserved_4[7];
 };
 static_assert(sizeof(void *) != 8 || sizeof(wexa_status) == 32);
@@ -214,19 +213,19 @@ struct xaac_stream_info {
 };
 static_assert(sizeof(void *) != 8 || offsetof(xaac_stream_info, sample_rate) == 4);
 
-// The FLAC source sets the byte at this offset of the reader's own state to 1 before every read.
+// The FLAC source sets the byte at this offset of the reader's state to 1 before every read.
 constexpr size_t kFlacReaderFlag = 2096;
 
 extern "C" {
 
-// WAV: chunks of interleaved PCM. seek takes whole seconds and stores 100-ns units.
+// WAV: chunks of interleaved PCM. seek takes whole seconds and stores 100-ns units in *reached.
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t *word);
 int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                       int64_t *second);
 int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32_t flags);
 void xwavd_delete(void *reader);
 
-// AAC in ADTS or ADIF form; a library may support one of them. create: reserved is null.
+// AAC in ADTS or ADIF form; a library may support only one of them. create: reserved is null.
 int32_t xaac_init(void);
 void xaac_deinit(void);
 void *xaacfd_create(const mtsrc_io *io, int64_t *word, xaac_info *info, void *reserved);
@@ -255,7 +254,7 @@ int32_t xflacd_decode(void *decoder, const wexa_frame *frame, wexa_output *outpu
 void xflacd_reset(void *decoder);
 void xflacd_delete(void *decoder);
 
-// MPEG audio, Layers I to III. get_frm: *first is 0 for the stream's first frame.
+// MPEG audio, Layers I to III. get_frm sets *first to 0 for the first frame of the stream.
 int32_t xmp123_init(void);
 void xmp123_deinit(void);
 void *xmp123fd_create(const mtsrc_io *io, int64_t *word, xmp123_info *info, void *reserved);
@@ -279,8 +278,8 @@ int32_t xmp4fds_get_frm(void *stream, void *buf, int32_t size, int32_t *bytes, i
                         int64_t *second);
 int32_t xmp4fds_seek(void *stream, const int64_t *position, int64_t *reached, int32_t flags);
 
-// Ogg, and Vorbis. get_format: with a null buf stores the set-up data's length, else copies the
-// data.
+// Ogg and Vorbis. get_format stores the length of the set-up data if buf is null; otherwise it
+// copies the data.
 void *xoggd_create(const mtsrc_io *io, int64_t *word, xogg_info *info, void *reserved);
 void xoggd_delete(void *demux);
 void *xoggds_open(void *demux, int32_t index, void *reserved);
