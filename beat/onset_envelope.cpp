@@ -10,11 +10,20 @@ namespace {
 
 constexpr double kPowerFloor = 0.0001;  // -80 dB
 
-// A worker and the samples it reads. Jobs have no scaled copy of the signal: worker.signal is null,
-// and the samples come from view.
+constexpr int64_t kRows =
+    3;  // mel rows of a worker: of the current two frames and the previous one
+
+typedef double mel_row[kMelBands];
+
+// A worker of compute_onset_envelope. Its signal, spectrum and mel are null: the samples come from
+// view, and rows are not kept.
 struct group_worker {
     TAVO_ONSET_WORKER worker;
     sample_view view;
+    double *flux;  // [F - 1] shared; a worker fills it from its first frame to before its last
+    mel_row rows[kRows];  // row k % kRows: decibels of frame k
+    mel_row first_row;    // decibels of the worker's first frame
+    bool is_complete;
 };
 static_assert(offsetof(group_worker, worker) == 0);  // the thread entry accepts both records
 
@@ -24,16 +33,13 @@ struct onset_group {
     int32_t done[kBeatWorkers];
     double *window;    // [N]
     TAVO_FFT_CTX fft;  // of size N
-    double *decibels;  // [F][36]
-    double **mel;      // [F] pointers to rows of decibels
-    float *power;      // [2 * kBeatWorkers][N / 2] two rows per worker, used in turn
-    float **spectrum;  // [F] pointers to rows of power
+    double *flux;      // [F - 1]
 };
 
 // A non-zero weight of the mel matrix.
 struct mel_term {
-    int64_t bin;
-    double weight;
+    double_pair weight;
+    const double_pair *power;  // of its bin
 };
 
 // Scratch of one worker. Lane 0 is analysis frame k, lane 1 the next one.
@@ -54,9 +60,9 @@ double *create_hann_window(int32_t size) {
     return window;
 }
 
-sample_view samples_of(const TAVO_ONSET_WORKER *worker) {
-    if (worker->signal != nullptr) return {worker->signal, 1.0};
-    return reinterpret_cast<const group_worker *>(worker)->view;
+// The group_worker that the record belongs to; null for a caller's own record.
+group_worker *group_record(TAVO_ONSET_WORKER *worker) {
+    return worker->signal == nullptr ? reinterpret_cast<group_worker *>(worker) : nullptr;
 }
 
 bool allocate_scratch(const TAVO_ONSET_WORKER *worker, worker_scratch *scratch) {
@@ -74,8 +80,9 @@ bool allocate_scratch(const TAVO_ONSET_WORKER *worker, worker_scratch *scratch) 
     int64_t count = 0;
     for (int64_t band = 0; band < bands; ++band) {
         for (int64_t bin = 0; bin < size / 2; ++bin) {
-            const float weight = worker->mel_matrix[bin][band];
-            if (weight != 0.0f) scratch->terms[count++] = {bin, static_cast<double>(weight)};
+            const auto weight = static_cast<double>(worker->mel_matrix[bin][band]);
+            if (weight == 0.0) continue;
+            scratch->terms[count++] = {double_pair{weight, weight}, scratch->re + bin};
         }
         scratch->band_end[band] = count;
     }
@@ -89,29 +96,46 @@ void release_scratch(worker_scratch *scratch) {
     free(scratch->band_end);
 }
 
-// Computes the powers of the frames k and next in single precision and fills their spectrum rows.
-void compute_powers(const TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
-                    const worker_scratch *scratch) {
-    const int64_t shift = (next - k) * worker->hop_size;
-    sample_view view = samples_of(worker);
-    view.samples += k * worker->hop_size;
-    scale_samples(view, worker->frame_size + shift, scratch->samples);
-    double_pair *re = scratch->re;
-    double_pair *im = scratch->im;
-    for (int64_t i = 0; i < worker->frame_size; ++i) {
-        const double_pair pair = {scratch->samples[i], scratch->samples[i + shift]};
-        re[i] = pair * worker->window[i];
-        im[i] = double_pair{0.0, 0.0};
-    }
-    transform_pair(re, im, worker->frame_size, worker->fft);
+// Scales the samples of the frames k and next, except those that the two frames before have too.
+void scale_frames(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next, double *samples) {
+    const group_worker *record = group_record(worker);
+    sample_view view = record != nullptr ? record->view : sample_view{worker->signal, 1.0};
+    const int64_t size = worker->frame_size;
+    const int64_t hop = worker->hop_size;
+    const int64_t kept = k > worker->first ? std::max<int64_t>(size - hop, 0) : 0;
+    if (kept > 0) std::copy_n(samples + 2 * hop, kept, samples);
+    view.samples += k * hop + kept;
+    scale_samples(view, size + (next - k) * hop - kept, samples + kept);
+}
 
-    float *first_row = worker->spectrum[k];
-    float *second_row = worker->spectrum[next];
-    for (int64_t j = 0; j < worker->frame_size / 2; ++j) {
-        const auto power = __builtin_convertvector(re[j] * re[j] + im[j] * im[j], float_pair);
-        re[j] = __builtin_convertvector(power, double_pair);
-        first_row[j] = power[0];
-        second_row[j] = power[1];
+// Replaces re by the powers of the bins, rounded to single precision. Returns true if all of them
+// are finite.
+bool compute_powers(int32_t bins, double_pair *re, const double_pair *im) {
+    double_pair sum = {0.0, 0.0};
+    for (int32_t j = 0; j < bins; ++j) {
+        const double_pair power = re[j] * re[j] + im[j] * im[j];
+        re[j] = __builtin_convertvector(__builtin_convertvector(power, float_pair), double_pair);
+        sum += re[j];
+    }
+    return std::isfinite(sum[0]) && std::isfinite(sum[1]);
+}
+
+// Computes the powers of the frames k and next and fills their spectrum rows if the record has any.
+void compute_spectrum(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
+                      const worker_scratch *scratch) {
+    const int32_t size = worker->frame_size;
+    const int32_t bins = size / 2;
+    scale_frames(worker, k, next, scratch->samples);
+    const frame_pair frames = {scratch->samples, scratch->samples + (next - k) * worker->hop_size,
+                               worker->window};
+    transform_frames(frames, scratch->re, scratch->im, size, worker->fft);
+    if (!compute_powers(bins, scratch->re, scratch->im)) {
+        transform_plainly(frames, scratch->re, scratch->im, size, worker->fft);
+        compute_powers(bins, scratch->re, scratch->im);
+    }
+    for (int32_t j = 0; j < bins && worker->spectrum != nullptr; ++j) {
+        worker->spectrum[k][j] = static_cast<float>(scratch->re[j][0]);
+        worker->spectrum[next][j] = static_cast<float>(scratch->re[j][1]);
     }
 }
 
@@ -119,103 +143,28 @@ double decibels_of(double power) {
     return 20.0 * log10(power < kPowerFloor ? kPowerFloor : power);
 }
 
+double *mel_row_of(TAVO_ONSET_WORKER *worker, int64_t k) {
+    group_worker *record = group_record(worker);
+    return record != nullptr ? record->rows[k % kRows] : worker->mel[k];
+}
+
 // Fills the mel rows of the frames k and next. As in MultiplyMtxs, terms with a zero factor are
 // skipped.
-void compute_bands(const TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
+void compute_bands(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
                    const worker_scratch *scratch) {
+    double *row = mel_row_of(worker, k);
+    double *next_row = mel_row_of(worker, next);
     const double_pair zero = {0.0, 0.0};
     const mel_term *term = scratch->terms;
     for (int32_t band = 0; band < worker->band_count; ++band) {
         double_pair sum = zero;
         for (; term < scratch->terms + scratch->band_end[band]; ++term) {
-            const double_pair power = scratch->re[term->bin];
+            const double_pair power = *term->power;
             sum += power != zero ? power * term->weight : zero;
         }
-        worker->mel[k][band] = decibels_of(sum[0]);
-        worker->mel[next][band] = decibels_of(sum[1]);
+        row[band] = decibels_of(sum[0]);
+        next_row[band] = decibels_of(sum[1]);
     }
-}
-
-// Computes a worker's analysis frames, two at a time; the last of an odd number is paired with
-// itself. If memory runs out, it clears the record's mel pointer, which run_group checks.
-void run_onset_worker(void *record) {
-    auto *worker = static_cast<TAVO_ONSET_WORKER *>(record);
-    if (worker->first > worker->last) return;
-    worker_scratch scratch = {};
-    if (allocate_scratch(worker, &scratch)) {
-        for (int64_t k = worker->first; k <= worker->last; k += 2) {
-            const int64_t next = std::min(k + 1, worker->last);
-            compute_powers(worker, k, next, &scratch);
-            compute_bands(worker, k, next, &scratch);
-        }
-    } else {
-        worker->mel = nullptr;
-    }
-    release_scratch(&scratch);
-}
-
-void release_group(onset_group *group) {
-    free(group->window);
-    tavo_fft_deinit(&group->fft);
-    free(group->decibels);
-    free(group->mel);
-    free(group->power);
-    free(group->spectrum);
-}
-
-bool allocate_group(int64_t frames, int32_t frame_size, onset_group *group) {
-    const int64_t bins = frame_size / 2;
-    tavo_fft_init(static_cast<int16_t>(frame_size), &group->fft);
-    group->window = create_hann_window(frame_size);
-    group->decibels = zeroed_items<double>(frames * kMelBands);
-    group->mel = zeroed_items<double *>(frames);
-    group->power = zeroed_items<float>(2 * kBeatWorkers * bins);
-    group->spectrum = zeroed_items<float *>(frames);
-    return group->fft.cos_table != nullptr && group->window != nullptr &&
-           group->decibels != nullptr && group->mel != nullptr && group->power != nullptr &&
-           group->spectrum != nullptr;
-}
-
-// Fills one worker's record and row pointers. A single frame is given to no worker, because it may
-// extend past the end of the signal.
-void fill_worker(const TAVO_BEAT_CTX *beat, int32_t id, int32_t frame_size, int32_t hop_size,
-                 onset_group *group) {
-    const int64_t length = beat->frame_count / kBeatWorkers;
-    const int64_t end = beat->frame_count == 1 ? 0 : beat->frame_count;
-    TAVO_ONSET_WORKER *worker = &group->members[id].worker;
-    worker->id = id;
-    worker->signal = beat->signal;
-    worker->first = id * length;
-    worker->last = (id == kBeatWorkers - 1 ? end : (id + 1) * length) - 1;
-    worker->spectrum = group->spectrum;
-    worker->frame_size = frame_size;
-    worker->hop_size = hop_size;
-    worker->first_sample = worker->first * hop_size;
-    worker->fft = &group->fft;
-    worker->done_flags = group->done;
-    worker->thread_count = kBeatWorkers;
-    worker->mutex = feat_mutex_mt;
-    worker->cond = feat_cond_mt;
-    worker->band_count = kMelBands;
-    worker->mel_matrix = beat->mel_matrix;
-    worker->mel = group->mel;
-    worker->window = group->window;
-    for (int64_t k = worker->first; k <= worker->last; ++k) {
-        group->mel[k] = group->decibels + k * kMelBands;
-        group->spectrum[k] = group->power + (2 * id + k % 2) * (frame_size / 2);
-    }
-}
-
-// Returns true if every worker computed all of its frames.
-bool run_group(onset_group *group, const side_work *side) {
-    worker_slot slots[kBeatWorkers];
-    for (int32_t id = 0; id < kBeatWorkers; ++id) {
-        TAVO_ONSET_WORKER *worker = &group->members[id].worker;
-        slots[id] = {worker, &worker->thread, _tavo_proc_onsetenv, run_onset_worker};
-    }
-    worker_group_run(slots, kBeatWorkers, feat_mutex_mt, feat_cond_mt, group->done, side);
-    return std::all_of(group->members, group->members + kBeatWorkers,
-                       [](const group_worker &member) { return member.worker.mel != nullptr; });
 }
 
 // Mean absolute difference of two rows: rises and falls both count.
@@ -228,14 +177,99 @@ double spectral_flux(const double *row, const double *next) {
     return sum / kMelBands;
 }
 
-// Fills env[count] with the spectral flux between neighbouring rows, divided by its standard
-// deviation.
-void fill_envelope(double *const *mel, int64_t count, double *env) {
-    for (int64_t k = 0; k < count; ++k) env[k] = spectral_flux(mel[k], mel[k + 1]);
+// Fills the flux from each of the frames k - 1 to end - 2 to the next one.
+void compute_flux(group_worker *record, int64_t k, int64_t end) {
+    for (; k < end; ++k) {
+        const double *row = record->rows[k % kRows];
+        if (k == record->worker.first) {
+            std::copy_n(row, kMelBands, record->first_row);
+        } else {
+            record->flux[k - 1] = spectral_flux(record->rows[(k - 1) % kRows], row);
+        }
+    }
+}
+
+// Computes a worker's analysis frames, two at a time; the last of an odd number is paired with
+// itself.
+// If memory runs out, the rows of a caller's own record are left unchanged.
+void run_onset_worker(void *argument) {
+    auto *worker = static_cast<TAVO_ONSET_WORKER *>(argument);
+    group_worker *record = group_record(worker);
+    worker_scratch scratch = {};
+    const bool is_ready = worker->first > worker->last || allocate_scratch(worker, &scratch);
+    for (int64_t k = worker->first; k <= worker->last && is_ready; k += 2) {
+        const int64_t next = std::min(k + 1, worker->last);
+        compute_spectrum(worker, k, next, &scratch);
+        compute_bands(worker, k, next, &scratch);
+        if (record != nullptr) compute_flux(record, k, next + 1);
+    }
+    if (record != nullptr) record->is_complete = is_ready;
+    release_scratch(&scratch);
+}
+
+void release_group(onset_group *group) {
+    free(group->window);
+    tavo_fft_deinit(&group->fft);
+    free(group->flux);
+}
+
+bool allocate_group(int64_t frames, int32_t frame_size, onset_group *group) {
+    tavo_fft_init(static_cast<int16_t>(frame_size), &group->fft);
+    group->window = create_hann_window(frame_size);
+    group->flux = zeroed_items<double>(frames);
+    return group->fft.cos_table != nullptr && group->window != nullptr && group->flux != nullptr;
+}
+
+// Fills one worker's record. A single frame is given to no worker, because it may extend past the
+// end of the signal.
+void fill_worker(const TAVO_BEAT_CTX *beat, sample_view view, int32_t id, int32_t frame_size,
+                 int32_t hop_size, onset_group *group) {
+    const int64_t length = beat->frame_count / kBeatWorkers;
+    const int64_t end = beat->frame_count == 1 ? 0 : beat->frame_count;
+    group->members[id].view = view;
+    group->members[id].flux = group->flux;
+    TAVO_ONSET_WORKER *worker = &group->members[id].worker;
+    worker->id = id;
+    worker->first = id * length;
+    worker->last = (id == kBeatWorkers - 1 ? end : (id + 1) * length) - 1;
+    worker->frame_size = frame_size;
+    worker->hop_size = hop_size;
+    worker->first_sample = worker->first * hop_size;
+    worker->fft = &group->fft;
+    worker->done_flags = group->done;
+    worker->thread_count = kBeatWorkers;
+    worker->mutex = feat_mutex_mt;
+    worker->cond = feat_cond_mt;
+    worker->band_count = kMelBands;
+    worker->mel_matrix = beat->mel_matrix;
+    worker->window = group->window;
+}
+
+// Returns true if every worker computed all of its frames.
+bool run_group(onset_group *group, const side_work *side) {
+    worker_slot slots[kBeatWorkers];
+    for (int32_t id = 0; id < kBeatWorkers; ++id) {
+        TAVO_ONSET_WORKER *worker = &group->members[id].worker;
+        slots[id] = {worker, &worker->thread, _tavo_proc_onsetenv, run_onset_worker};
+    }
+    worker_group_run(slots, kBeatWorkers, feat_mutex_mt, feat_cond_mt, group->done, side);
+    return std::all_of(group->members, group->members + kBeatWorkers,
+                       [](const group_worker &member) { return member.is_complete; });
+}
+
+// Fills env[count] with the spectral flux between neighbouring frames, divided by its standard
+// deviation. Adds the flux from each worker's last frame to the first one of the next worker.
+void fill_envelope(onset_group *group, int64_t count, double *env) {
+    for (int32_t id = 0; id + 1 < kBeatWorkers; ++id) {
+        const group_worker *member = &group->members[id];
+        const int64_t last = member->worker.last;
+        if (last < member->worker.first) continue;
+        group->flux[last] = spectral_flux(member->rows[last % kRows], (member + 1)->first_row);
+    }
     double mean = 0.0;
     double deviation = 0.0;
-    getMeanStd(env, count, &mean, &deviation);
-    for (int64_t k = 0; k < count; ++k) env[k] /= deviation;
+    getMeanStd(group->flux, count, &mean, &deviation);
+    for (int64_t k = 0; k < count; ++k) env[k] = group->flux[k] / deviation;
 }
 
 }  // namespace
@@ -262,11 +296,10 @@ void compute_onset_envelope(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame
     onset_group group = {};
     if (usable && allocate_group(beat->frame_count, frame_size, &group)) {
         for (int32_t id = 0; id < kBeatWorkers; ++id) {
-            fill_worker(beat, id, frame_size, hop_size, &group);
-            group.members[id].view = view;
+            fill_worker(beat, view, id, frame_size, hop_size, &group);
         }
-        const bool complete = run_group(&group, side);
-        if (complete) fill_envelope(group.mel, beat->frame_count - 1, beat->onset_env);
+        const bool is_complete = run_group(&group, side);
+        if (is_complete) fill_envelope(&group, beat->frame_count - 1, beat->onset_env);
     } else if (side != nullptr) {
         side->run(side->arg);
     }

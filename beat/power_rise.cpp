@@ -42,12 +42,12 @@ double level_db(int32_t level) {
 // their order. Passes the sums to use in pairs.
 template <typename Use>
 void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
-    double squares[kChunk + 2 * kSumRadius];
+    double squares[kChunk + 2 * kSumRadius] = {};
     for (int64_t done = 0; done < count; done += kChunk) {
         const int64_t part = std::min(kChunk, count - done);
         const int64_t used = part + 2 * kSumRadius - 1;
         scale_samples({view.samples + (first + done - kSumRadius), view.full_scale}, used, squares);
-        for (int64_t i = 0; i < used; ++i) squares[i] *= squares[i];
+        for (double &square : squares) square *= square;  // a fixed number: in vectors
         for (int64_t j = 0; j < part; j += 2) {
             const auto two = [p = squares + j](int64_t k) { return load_pair(p + k); };
             const double_pair sum = two(0) + two(1) + two(2) + two(3) + two(4) + two(5) + two(6) +

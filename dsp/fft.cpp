@@ -22,6 +22,10 @@ void fill_twiddles(TAVO_FFT_CTX *ctx, int32_t n) {
     }
 }
 
+bool has_tables(const TAVO_FFT_CTX *ctx, int32_t n) {
+    return ctx->cos_table != nullptr && n == 1 << ctx->stages;
+}
+
 // Each swap is listed once, at its lower index; all other entries are 0.
 void fill_bit_reverse(TAVO_FFT_CTX *ctx, int32_t n) {
     const auto bits = static_cast<uint32_t>(ctx->stages);
@@ -65,59 +69,137 @@ inline void store(const spectrum<T> &x, size_t i, complex<T> value) {
     x.im[i] = value.im;
 }
 
+inline complex<double> twiddle(const TAVO_FFT_CTX *ctx, size_t k) {
+    return {ctx->cos_table[k], ctx->sin_table[k]};
+}
+
 // top becomes top + w * bottom, bottom becomes top - w * bottom.
 template <typename T>
-inline void butterfly(complex<T> *top, complex<T> *bottom, double w_re, double w_im) {
-    const complex<T> t = {bottom->re * w_re - bottom->im * w_im,
-                          bottom->re * w_im + bottom->im * w_re};
+inline void butterfly(complex<T> *top, complex<T> *bottom, complex<double> w) {
+    const complex<T> t = {bottom->re * w.re - bottom->im * w.im,
+                          bottom->re * w.im + bottom->im * w.re};
     *bottom = {top->re - t.re, top->im - t.im};
     *top = {top->re + t.re, top->im + t.im};
 }
 
-// Radix 2, decimation in time. Each pass over the data runs two stages on four elements at a time,
-// which stay in registers between the stages. If the number of stages is odd, the first one has a
-// pass of its own.
+template <typename T>
+void run_stage(const spectrum<T> &x, size_t half, size_t size, const TAVO_FFT_CTX *ctx) {
+    const size_t stride = size / (2 * half);
+    for (size_t j = 0; j < half; ++j) {
+        const complex<double> w = twiddle(ctx, stride * j);
+        for (size_t i = j; i < size; i += 2 * half) {
+            complex<T> a = load(x, i);
+            complex<T> b = load(x, i + half);
+            butterfly(&a, &b, w);
+            store(x, i, a);
+            store(x, i + half, b);
+        }
+    }
+}
+
+// Runs a stage and the next one on four elements at a time, which stay in registers between the
+// stages. half: distance of the two inputs of a butterfly in the first of the stages.
+template <typename T>
+void run_two_stages(const spectrum<T> &x, size_t half, size_t size, const TAVO_FFT_CTX *ctx) {
+    const size_t stride = size / (4 * half);  // of the second stage's twiddle factors
+    for (size_t j = 0; j < half; ++j) {
+        const complex<double> w0 = twiddle(ctx, 2 * stride * j);
+        const complex<double> w1 = twiddle(ctx, stride * j);
+        const complex<double> w2 = twiddle(ctx, stride * (j + half));
+        for (size_t i = j; i < size; i += 4 * half) {
+            complex<T> a = load(x, i);
+            complex<T> b = load(x, i + half);
+            complex<T> c = load(x, i + 2 * half);
+            complex<T> d = load(x, i + 3 * half);
+            butterfly(&a, &b, w0);
+            butterfly(&c, &d, w0);
+            butterfly(&a, &c, w1);
+            butterfly(&b, &d, w2);
+            store(x, i, a);
+            store(x, i + half, b);
+            store(x, i + 2 * half, c);
+            store(x, i + 3 * half, d);
+        }
+    }
+}
+
+// Runs the stages from the one on whose butterflies have inputs half elements apart.
+template <typename T>
+void run_stages(const spectrum<T> &x, size_t half, const TAVO_FFT_CTX *ctx) {
+    const size_t size = size_t{1} << ctx->stages;
+    const int32_t done = count_halvings(static_cast<int32_t>(half));
+    if ((ctx->stages - done) % 2 != 0) {
+        run_stage(x, half, size, ctx);
+        half *= 2;
+    }
+    for (; half < size; half *= 4) run_two_stages(x, half, size, ctx);
+}
+
+// Radix 2, decimation in time.
 template <typename T>
 void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
-    if (ctx->cos_table == nullptr || n != 1 << ctx->stages) return;
+    if (!has_tables(ctx, n)) return;
     permute(re, im, n, ctx->bit_reverse);
-    const spectrum<T> x = {re, im};
-    const double *w_re = ctx->cos_table;
-    const double *w_im = ctx->sin_table;
-    const auto size = static_cast<size_t>(n);
-    size_t half = 1;  // distance of the two inputs of a butterfly in the pass's first stage
-    if (ctx->stages % 2 != 0) {
-        for (size_t i = 0; i < size; i += 2) {
-            complex<T> a = load(x, i);
-            complex<T> b = load(x, i + 1);
-            butterfly(&a, &b, w_re[0], w_im[0]);
-            store(x, i, a);
-            store(x, i + 1, b);
-        }
-        half = 2;
-    }
-    for (; half < size; half *= 4) {
-        const size_t stride = size / (4 * half);  // of the second stage's twiddle factors
-        for (size_t j = 0; j < half; ++j) {
-            const complex<double> w0 = {w_re[2 * stride * j], w_im[2 * stride * j]};
-            const complex<double> w1 = {w_re[stride * j], w_im[stride * j]};
-            const complex<double> w2 = {w_re[stride * (j + half)], w_im[stride * (j + half)]};
-            for (size_t i = j; i < size; i += 4 * half) {
-                complex<T> a = load(x, i);
-                complex<T> b = load(x, i + half);
-                complex<T> c = load(x, i + 2 * half);
-                complex<T> d = load(x, i + 3 * half);
-                butterfly(&a, &b, w0.re, w0.im);
-                butterfly(&c, &d, w0.re, w0.im);
-                butterfly(&a, &c, w1.re, w1.im);
-                butterfly(&b, &d, w2.re, w2.im);
-                store(x, i, a);
-                store(x, i + half, b);
-                store(x, i + 2 * half, c);
-                store(x, i + 3 * half, d);
-            }
-        }
-    }
+    run_stages<T>({re, im}, 1, ctx);
+}
+
+// The outputs of a butterfly of two real values.
+struct real_pair {
+    complex<double_pair> sum;
+    complex<double_pair> difference;
+};
+
+inline real_pair real_butterfly(double_pair top, double_pair bottom, complex<double> w) {
+    const complex<double_pair> t = {bottom * w.re, bottom * w.im};
+    return {{top + t.re, t.im}, {top - t.re, -t.im}};
+}
+
+inline double_pair windowed(const frame_pair &frames, size_t i) {
+    return double_pair{frames.first[i], frames.second[i]} * frames.window[i];
+}
+
+constexpr size_t kFirstGroup = 8;  // elements that the first three stages combine
+
+// Runs the first three stages on the group of elements at first: the windowed samples from i on in
+// steps of step. Products with the factor 1 and with imaginary parts of zero are left out, which
+// changes only the sign of zeros if the results are finite.
+inline void start_group(const frame_pair &frames, size_t i, size_t step, size_t first,
+                        const spectrum<double_pair> &x, const TAVO_FFT_CTX *ctx) {
+    const double_pair zero = {0.0, 0.0};
+    const complex<double> quarter = twiddle(ctx, 2 * step);
+    const double_pair a = windowed(frames, i);
+    const double_pair b = windowed(frames, i + 4 * step);
+    const double_pair c = windowed(frames, i + 2 * step);
+    const double_pair d = windowed(frames, i + 6 * step);
+    const double_pair even = (a + b) + (c + d);
+    const double_pair even_turned = (a + b) - (c + d);
+    real_pair low = real_butterfly(a - b, c - d, quarter);
+    const double_pair e = windowed(frames, i + step);
+    const double_pair f = windowed(frames, i + 5 * step);
+    const double_pair g = windowed(frames, i + 3 * step);
+    const double_pair h = windowed(frames, i + 7 * step);
+    const double_pair odd = (e + f) + (g + h);
+    const double_pair odd_turned = (e + f) - (g + h);
+    real_pair high = real_butterfly(e - f, g - h, quarter);
+
+    store(x, first, {even + odd, zero});
+    store(x, first + 4, {even - odd, zero});
+    const real_pair middle = real_butterfly(even_turned, odd_turned, quarter);
+    store(x, first + 2, middle.sum);
+    store(x, first + 6, middle.difference);
+    butterfly(&low.sum, &high.sum, twiddle(ctx, step));
+    store(x, first + 1, low.sum);
+    store(x, first + 5, high.sum);
+    butterfly(&low.difference, &high.difference, twiddle(ctx, 3 * step));
+    store(x, first + 3, low.difference);
+    store(x, first + 7, high.difference);
+}
+
+// Counts in bit-reversed order: returns the successor of x among the numbers below limit.
+size_t next_reversed(size_t x, size_t limit) {
+    size_t bit = limit / 2;
+    for (; (x & bit) != 0; bit /= 2) x -= bit;
+    return x + bit;
 }
 
 }  // namespace
@@ -144,8 +226,29 @@ double *tavo_fft_proc(double *re, double *im, int16_t n, const TAVO_FFT_CTX *ctx
     return re;
 }
 
-void transform_pair(double_pair *re, double_pair *im, int32_t n, const TAVO_FFT_CTX *ctx) {
+void transform_plainly(const frame_pair &frames, double_pair *re, double_pair *im, int32_t n,
+                       const TAVO_FFT_CTX *ctx) {
+    for (int32_t i = 0; i < n; ++i) {
+        re[i] = windowed(frames, static_cast<size_t>(i));
+        im[i] = double_pair{0.0, 0.0};
+    }
     transform(re, im, n, ctx);
+}
+
+void transform_frames(const frame_pair &frames, double_pair *re, double_pair *im, int32_t n,
+                      const TAVO_FFT_CTX *ctx) {
+    const auto size = static_cast<size_t>(n);
+    if (!has_tables(ctx, n) || size < kFirstGroup) {
+        transform_plainly(frames, re, im, n, ctx);
+        return;
+    }
+    const size_t groups = size / kFirstGroup;
+    size_t reversed = 0;
+    for (size_t first = 0; first < size; first += kFirstGroup) {
+        start_group(frames, reversed, groups, first, {re, im}, ctx);
+        reversed = next_reversed(reversed, groups);
+    }
+    run_stages<double_pair>({re, im}, kFirstGroup, ctx);
 }
 
 void tavo_fft_deinit(TAVO_FFT_CTX *ctx) {

@@ -42,7 +42,19 @@ void tavo_fft_deinit(TAVO_FFT_CTX *ctx);
 uint32_t bit_reverse2(uint32_t bits, uint32_t x);
 }
 
-// Two transforms at once, bit-identical to tavo_fft_proc on each lane.
-void transform_pair(double_pair *re, double_pair *im, int32_t n, const TAVO_FFT_CTX *ctx);
+// Two real frames side by side, each to be weighted by the window.
+struct frame_pair {
+    const double *first;   // [n]
+    const double *second;  // [n]
+    const double *window;  // [n]
+};
+
+// Transforms two windowed frames to re[n], im[n], bit-identical to tavo_fft_proc on each frame.
+void transform_plainly(const frame_pair &frames, double_pair *re, double_pair *im, int32_t n,
+                       const TAVO_FFT_CTX *ctx);
+
+// The same, faster, for results that are all finite; zeros may have the other sign.
+void transform_frames(const frame_pair &frames, double_pair *re, double_pair *im, int32_t n,
+                      const TAVO_FFT_CTX *ctx);
 
 #endif
