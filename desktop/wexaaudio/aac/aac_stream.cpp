@@ -1,6 +1,8 @@
 #include "desktop/wexaaudio/aac/aac_stream.h"
 
 #include <algorithm>
+#include <cstdlib>
+#include <cstring>
 
 namespace {
 
@@ -82,5 +84,9 @@ bool aac_stream_complete(io_file *file, aac_config *config, stream_info *info) {
     info->group = kGroup;
     const bool plain = config->object_type == kAacLowComplexity && !sbr;
     info->preroll = plain ? kPreroll : kLongPreroll;
-    return stream_set_up(info, config->bytes, config->size);
+    const auto bytes = static_cast<size_t>(config->size);
+    info->setup_bytes = config->size;
+    info->setup = static_cast<uint8_t *>(malloc(bytes));
+    if (info->setup != nullptr) memcpy(info->setup, config->bytes, bytes);
+    return info->setup != nullptr;
 }

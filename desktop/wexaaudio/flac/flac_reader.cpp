@@ -38,21 +38,14 @@ struct flac_stream {
     bool damaged;                  // the frame being decoded has a wrong check sum
 };
 
-// The result of a scan.
-struct flac_extent {
-    int32_t rate;  // Hz
-    int64_t base;  // number of the stream's first sample
-    int64_t end;   // sample frames
-};
-
 struct flac_reader {
     uint8_t reserved[kFlacReaderFlag];
     uint8_t flag;  // set by the source before every read; nothing depends on it
     io_file file;
     flac_stream stream;
-    const flac_extent *extent;  // shared by the readers of the file
-    int64_t next;               // sample delivered next
-    bool moved;                 // after a seek, until the decoder follows
+    const stream_info *info;  // shared by the readers of the file
+    int64_t next;             // sample delivered next
+    bool moved;               // after a seek, until the decoder follows
 };
 static_assert(offsetof(flac_reader, flag) == kFlacReaderFlag);
 
@@ -69,29 +62,6 @@ FLAC__StreamDecoderReadStatus read_bytes(const FLAC__StreamDecoder * /*decoder*/
     s->at += got;
     return got == 0 ? FLAC__STREAM_DECODER_READ_STATUS_END_OF_STREAM
                     : FLAC__STREAM_DECODER_READ_STATUS_CONTINUE;
-}
-
-FLAC__StreamDecoderSeekStatus move_to(const FLAC__StreamDecoder * /*decoder*/, FLAC__uint64 offset,
-                                      void *client) {
-    stream_of(client)->at = static_cast<int64_t>(offset);
-    return FLAC__STREAM_DECODER_SEEK_STATUS_OK;
-}
-
-FLAC__StreamDecoderTellStatus tell(const FLAC__StreamDecoder * /*decoder*/, FLAC__uint64 *offset,
-                                   void *client) {
-    *offset = static_cast<FLAC__uint64>(stream_of(client)->at);
-    return FLAC__STREAM_DECODER_TELL_STATUS_OK;
-}
-
-FLAC__StreamDecoderLengthStatus get_length(const FLAC__StreamDecoder * /*decoder*/,
-                                           FLAC__uint64 *length, void *client) {
-    *length = static_cast<FLAC__uint64>(stream_of(client)->file->size);
-    return FLAC__STREAM_DECODER_LENGTH_STATUS_OK;
-}
-
-FLAC__bool is_at_end(const FLAC__StreamDecoder * /*decoder*/, void *client) {
-    const flac_stream *s = stream_of(client);
-    return s->at >= s->file->size ? 1 : 0;
 }
 
 void read_info(const FLAC__StreamDecoder * /*decoder*/, const FLAC__StreamMetadata *metadata,
@@ -118,8 +88,8 @@ void store_pairs(const FLAC__int32 *left, const FLAC__int32 *right, int32_t bits
             pcm[2 * i + 1] = static_cast<int16_t>(convert(right[i]));
         }
     };
-    if (bits <= 16)
-        return store([&](FLAC__int32 x) { return static_cast<uint32_t>(x) << (16 - bits); });
+    const int32_t up = 16 - bits;
+    if (up >= 0) return store([=](FLAC__int32 x) { return static_cast<uint32_t>(x) << up; });
     const int32_t half = 1 << (bits - 17);  // rounded to nearest, up at half; the top is clipped
     store([&](FLAC__int32 x) {
         return std::min((x >> (bits - 16)) + ((x & half) != 0 ? 1 : 0), 32767);
@@ -145,11 +115,26 @@ FLAC__StreamDecoderWriteStatus store_block(const FLAC__StreamDecoder * /*decoder
 }
 
 bool open_stream(flac_stream *s, io_file *file) {
+    const auto seek = [](const auto *, FLAC__uint64 offset, void *client) {
+        stream_of(client)->at = static_cast<int64_t>(offset);
+        return FLAC__STREAM_DECODER_SEEK_STATUS_OK;
+    };
+    const auto tell = [](const auto *, FLAC__uint64 *offset, void *client) {
+        *offset = static_cast<FLAC__uint64>(stream_of(client)->at);
+        return FLAC__STREAM_DECODER_TELL_STATUS_OK;
+    };
+    const auto length = [](const auto *, FLAC__uint64 *bytes, void *client) {
+        *bytes = static_cast<FLAC__uint64>(stream_of(client)->file->size);
+        return FLAC__STREAM_DECODER_LENGTH_STATUS_OK;
+    };
+    const auto at_end = [](const auto *, void *client) -> FLAC__bool {
+        return stream_of(client)->at >= stream_of(client)->file->size ? 1 : 0;
+    };
     s->file = file;
     s->decoder = FLAC__stream_decoder_new();
     if (s->decoder == nullptr ||
-        FLAC__stream_decoder_init_stream(s->decoder, read_bytes, move_to, tell, get_length,
-                                         is_at_end, store_block, read_info, note_error,
+        FLAC__stream_decoder_init_stream(s->decoder, read_bytes, seek, tell, length, at_end,
+                                         store_block, read_info, note_error,
                                          s) != FLAC__STREAM_DECODER_INIT_STATUS_OK ||
         FLAC__stream_decoder_process_until_end_of_metadata(s->decoder) == 0 || s->max_block <= 0) {
         return false;
@@ -216,49 +201,41 @@ bool find_end(flac_stream *s, int64_t *end) {
     return !s->file->failed && *end > 0 && *end / kMaxSamplesPerByte <= size;
 }
 
-bool scan_stream(flac_stream *s, io_file *file, flac_extent *extent) {
-    if (!open_stream(s, file) || !decode_block(s) || s->rate <= 0) return false;
-    extent->rate = s->rate;
-    extent->base = s->base = s->block;
-    return find_end(s, &extent->end);
-}
-
-bool scan_file(io_file *file, void *result) {
-    flac_stream stream = {};
-    const bool found = scan_stream(&stream, file, static_cast<flac_extent *>(result));
-    close_stream(&stream);
+bool scan_file(io_file *file, stream_info *info) {
+    flac_stream s = {};
+    bool found = open_stream(&s, file) && decode_block(&s) && s.rate > 0;
+    if (found) {
+        info->rate = s.rate;
+        info->base = s.base = s.block;
+        found = find_end(&s, &info->end);
+    }
+    close_stream(&s);
     return found;
 }
-
-constexpr scan_kind kScan = {sizeof(flac_extent), scan_file, nullptr};
 
 }  // namespace
 
 void *xflacfd_create(const mtsrc_io *io, int64_t * /*word*/, xflac_info *info,
                      void * /*reserved*/) {
     auto *r = static_cast<flac_reader *>(calloc(1, sizeof(flac_reader)));
-    if (r != nullptr && info != nullptr && io_file_open(&r->file, io)) {
-        r->extent = static_cast<const flac_extent *>(scan_cache_get(&r->file, &kScan));
-    }
-    if (r == nullptr || r->extent == nullptr || !open_stream(&r->stream, &r->file)) {
+    if (r == nullptr) return nullptr;
+    if (io_file_open(&r->file, io)) r->info = scan_cache_get(&r->file, scan_file);
+    if (r->info == nullptr || !open_stream(&r->stream, &r->file)) {
         xflacfd_delete(r);
         return nullptr;
     }
-    r->stream.base = r->extent->base;
-    info->sample_rate = r->extent->rate;
-    info->duration = units_of_duration(r->extent->end, r->extent->rate);
+    r->stream.base = r->info->base;
+    info->sample_rate = r->info->rate;
+    info->duration = units_of_duration(r->info->end, r->info->rate);
     return r;
 }
 
 int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                         int64_t *second) {
     auto *r = static_cast<flac_reader *>(reader);
-    if (r == nullptr || buf == nullptr || bytes == nullptr || first == nullptr ||
-        second == nullptr || size < kPair) {
-        return -1;
-    }
+    if (size < kPair) return -1;
     flac_stream *s = &r->stream;
-    if (r->next >= r->extent->end) return kWexaEndOfStream;
+    if (r->next >= r->info->end) return kWexaEndOfStream;
     if (r->moved && !find_sample(s, r->next)) {
         // Where seeking fails, the stream is read from the start up to the position.
         r->file.failed = false;
@@ -269,7 +246,7 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     while (more && (s->count == 0 || s->block + s->count <= r->next)) more = decode_block(s);
     if (r->file.failed) return -1;
     const int64_t inside = r->next - s->block;  // below 0 in silence before the block
-    const int64_t left = std::min<int64_t>(r->extent->end - r->next, size / kPair);
+    const int64_t left = std::min<int64_t>(r->info->end - r->next, size / kPair);
     const int64_t samples = std::min(left, !more ? left : inside < 0 ? -inside : s->count - inside);
     *bytes = static_cast<int32_t>(samples) * kPair;
     if (more && inside >= 0) {
@@ -277,26 +254,24 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     } else {
         memset(buf, 0, static_cast<size_t>(*bytes));
     }
-    *first = units_from_samples(r->next, r->extent->rate);
-    *second = units_from_samples(samples, r->extent->rate);
+    *first = units_from_samples(r->next, r->info->rate);
+    *second = units_from_samples(samples, r->info->rate);
     r->next += samples;
     return 0;
 }
 
 int32_t xflacfd_seek(void *reader, const int64_t *position, int64_t *reached) {
     auto *r = static_cast<flac_reader *>(reader);
-    if (r == nullptr || position == nullptr || reached == nullptr) return -1;
-    r->next = seek_target(*position, r->extent->end, r->extent->rate);
-    *reached = units_from_samples(r->next, r->extent->rate);
+    r->next = seek_target(*position, r->info->end, r->info->rate);
+    *reached = units_from_samples(r->next, r->info->rate);
     r->moved = true;
     return 0;
 }
 
 void xflacfd_delete(void *reader) {
     auto *r = static_cast<flac_reader *>(reader);
-    if (r == nullptr) return;
     close_stream(&r->stream);
-    scan_cache_put(r->extent);
+    scan_cache_put(r->info);
     io_file_close(&r->file);
     free(r);
 }

@@ -32,55 +32,31 @@ bool read_mpeg_format(io_file *file, stream_info *info) {
     return true;
 }
 
-bool scan_file(io_file *file, void *result) {
-    auto *info = static_cast<stream_info *>(result);
+bool scan_file(io_file *file, stream_info *info) {
     mp4_codec codec = {};
     if (!mp4_read_boxes(file, info, &codec)) return false;
     if (codec.is_aac) return aac_stream_complete(file, &codec.config, info);
     return !codec.is_mpeg || read_mpeg_format(file, info);  // the source refuses any other codec
 }
 
-constexpr scan_kind kScan = {sizeof(stream_info), scan_file, stream_info_release};
-
 }  // namespace
 
 void *xmp4fd_create(const mtsrc_io *io, int32_t * /*word*/, xmp4_info *info, void * /*reserved*/) {
-    stream_reader *r = info != nullptr ? stream_open(io, &kScan) : nullptr;
+    stream_reader *r = stream_open(io, scan_file, &info->duration);
     if (r == nullptr) return nullptr;
     info->track_count = r->info->track_count;
     memcpy(info->kind, r->info->kind, sizeof info->kind);
-    info->duration = stream_duration(r);
     return r;
-}
-
-void xmp4fd_delete(void *demux) {
-    stream_close(demux);
-}
-
-void *xmp4fds_open(void *demux, int32_t track, void * /*reserved*/) {
-    const auto *r = static_cast<stream_reader *>(demux);
-    return r != nullptr && track >= 0 && track == r->info->track ? demux : nullptr;
 }
 
 void xmp4fds_close(void * /*stream*/) {}
 
 int32_t xmp4fds_get_info_aud(void *stream, xmp4_track *track) {
-    const auto *r = static_cast<stream_reader *>(stream);
-    if (r == nullptr || track == nullptr) return -1;
-    const char *codec = r->info->codec;
-    track->format_tag = codec == nullptr            ? 0
-                        : strcmp(codec, "aac") == 0 ? kWexaTagAac
-                                                    : kWexaTagMpegLayer3;
-    track->sample_rate = r->info->rate;
-    track->channels = r->info->channels;
+    const stream_info *info = static_cast<stream_reader *>(stream)->info;
+    track->format_tag = info->codec == nullptr            ? 0
+                        : strcmp(info->codec, "aac") == 0 ? kWexaTagAac
+                                                          : kWexaTagMpegLayer3;
+    track->sample_rate = info->rate;
+    track->channels = info->channels;
     return 0;
-}
-
-int32_t xmp4fds_get_frm(void *stream, void *buf, int32_t size, int32_t *bytes, int64_t *first,
-                        int64_t *second) {
-    return stream_read(stream, buf, size, bytes, first, second);
-}
-
-int32_t xmp4fds_seek(void *stream, const int64_t *position, int64_t *reached, int32_t /*flags*/) {
-    return stream_seek(stream, position, reached);
 }

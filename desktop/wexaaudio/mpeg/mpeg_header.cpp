@@ -24,9 +24,7 @@ constexpr int32_t kBitrates[2][3][15] = {
 
 int32_t frame_bytes(const mpeg_header &h, int32_t kbits, int32_t padding) {
     const int32_t bits = kbits * 1000;
-    if (h.layer == 1) {
-        return 4 * (12 * bits / h.rate + padding);
-    }
+    if (h.layer == 1) return 4 * (12 * bits / h.rate + padding);
     const int32_t factor = h.layer == 3 && h.version != 1 ? 72 : 144;
     return factor * bits / h.rate + padding;
 }
@@ -43,9 +41,7 @@ bool mpeg_parse(const uint8_t *p, mpeg_header *h) {
         return false;
     }
     h->version = version == kVersion1 ? 1 : version == kVersion25 ? 25 : 2;
-    if (h->version == 25 && layer != 3) {
-        return false;
-    }
+    if (h->version == 25 && layer != 3) return false;
     h->layer = layer;
     h->rate = kRates[rate] / (h->version == 1 ? 1 : h->version == 2 ? 2 : 4);
     h->channels = p[3] >> 6 == kModeMono ? 1 : 2;
@@ -67,9 +63,7 @@ int32_t mpeg_main_data_at(const mpeg_header *h) {
 }
 
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes) {
-    if (h->layer != 3) {
-        return false;
-    }
+    if (h->layer != 3) return false;
     // Some encoders ignore the check sum when they place the table.
     const int32_t at = mpeg_main_data_at(h);
     for (const int32_t place : {at, h->has_crc ? at - 2 : at}) {

@@ -5,7 +5,7 @@
 
 #include <cstdint>
 
-#include "desktop/wexaaudio/shared/stream.h"
+#include "desktop/wexaaudio/shared/scan_cache.h"
 
 constexpr int32_t kMpegHeaderBytes = 4;
 constexpr int32_t kMpegMaxFrame = 1732;    // bytes: Layer II, 384 kbit/s at 32 kHz, padded

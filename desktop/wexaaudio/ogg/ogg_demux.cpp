@@ -4,6 +4,7 @@
 // In: mtsrc_io. Out: PCM, the set-up data, the information records.
 #include <cstdlib>
 #include <cstring>
+#include <string_view>
 
 #include "desktop/wexaaudio/ogg/ogg_scan.h"
 #include "media_source/wexaaudio.h"
@@ -13,21 +14,8 @@ namespace {
 constexpr int32_t kReadBytes = 65536;
 constexpr int32_t kVorbis = 323;  // codec code
 
-struct codec_name {
-    const char *name;
-    size_t bytes;
-};
-
 // How the first packets of the audio codecs begin; Vorbis first.
-constexpr codec_name kAudio[] = {
-    {"\x01vorbis", 7},
-    {"OpusHead", 8},
-    {"\x7F"
-     "FLAC",
-     5},
-    {"fLaC", 4},
-    {"Speex   ", 8},
-};
+constexpr std::string_view kAudio[] = {"\x01vorbis", "OpusHead", "\177FLAC", "fLaC", "Speex   "};
 
 struct page_reader {
     ogg_sync_state sync;
@@ -60,11 +48,10 @@ bool next_page(page_reader *r, ogg_page *page, int64_t *offset) {
 void add_stream(stream_info *info, const ogg_page *page) {
     if (info->track_count >= kOggStreams) return;
     const int32_t i = info->track_count++;
-    for (const codec_name &audio : kAudio) {
-        if (page->body_len < static_cast<long>(audio.bytes) ||
-            memcmp(page->body, audio.name, audio.bytes) != 0) {
-            continue;
-        }
+    const std::string_view body(reinterpret_cast<const char *>(page->body),
+                                static_cast<size_t>(page->body_len));
+    for (const std::string_view &audio : kAudio) {
+        if (body.substr(0, audio.size()) != audio) continue;
         info->kind[i] = kWexaKindAudio;
         if (info->track >= 0) return;
         info->track = i;
@@ -96,8 +83,7 @@ bool read_pages(page_reader *r, ogg_scan *scan) {
     return true;
 }
 
-bool scan_file(io_file *file, void *result) {
-    auto *info = static_cast<stream_info *>(result);
+bool scan_file(io_file *file, stream_info *info) {
     page_reader r = {{}, file, 0, 0};
     ogg_sync_init(&r.sync);
     ogg_scan scan = {};
@@ -114,51 +100,29 @@ bool scan_file(io_file *file, void *result) {
     return !file->failed && info->track_count > 0;
 }
 
-constexpr scan_kind kScan = {sizeof(stream_info), scan_file, stream_info_release};
-
 }  // namespace
 
 void *xoggd_create(const mtsrc_io *io, int64_t * /*word*/, xogg_info *info, void * /*reserved*/) {
-    stream_reader *r = info != nullptr ? stream_open(io, &kScan) : nullptr;
+    stream_reader *r = stream_open(io, scan_file, &info->duration);
     if (r == nullptr) return nullptr;
     info->stream_count = r->info->track_count;
     memcpy(info->kind, r->info->kind, sizeof info->kind);
-    info->duration = stream_duration(r);
     return r;
-}
-
-void xoggd_delete(void *demux) {
-    stream_close(demux);
-}
-
-void *xoggds_open(void *demux, int32_t index, void * /*reserved*/) {
-    const auto *r = static_cast<stream_reader *>(demux);
-    return r != nullptr && index >= 0 && index == r->info->track ? demux : nullptr;
 }
 
 void xoggds_close(void * /*stream*/) {}
 
 int32_t xoggds_get_info_aud(void *stream, xogg_stream *info) {
     const auto *r = static_cast<stream_reader *>(stream);
-    if (r == nullptr || info == nullptr) return -1;
     info->codec = r->info->codec != nullptr ? kVorbis : 0;
     info->sample_rate = r->info->rate;
     return 0;
 }
 
 int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
-    const auto *r = static_cast<stream_reader *>(stream);
-    if (r == nullptr || length == nullptr || r->info->codec == nullptr) return -1;
-    *length = r->info->setup_bytes;
-    if (buf != nullptr) memcpy(buf, r->info->setup, static_cast<size_t>(r->info->setup_bytes));
+    const stream_info *info = static_cast<stream_reader *>(stream)->info;
+    if (info->codec == nullptr) return -1;
+    *length = info->setup_bytes;
+    if (buf != nullptr) memcpy(buf, info->setup, static_cast<size_t>(info->setup_bytes));
     return 0;
-}
-
-int32_t xoggds_get_frm(void *stream, void *buf, int32_t size, int32_t *bytes, int64_t *first,
-                       int64_t *second) {
-    return stream_read(stream, buf, size, bytes, first, second);
-}
-
-int32_t xoggds_seek(void *stream, const int64_t *position, int64_t *reached, int32_t /*flags*/) {
-    return stream_seek(stream, position, reached);
 }

@@ -9,8 +9,9 @@
 
 #include <ogg/ogg.h>
 
-#include "desktop/wexaaudio/ogg/vorbis_setup.h"
 #include "desktop/wexaaudio/shared/stream.h"
+
+constexpr int32_t kVorbisHeaders = 3;  // packets: identification, comments, set-up
 
 struct ogg_scan {
     io_file *file;

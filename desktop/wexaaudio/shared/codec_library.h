@@ -11,6 +11,7 @@ struct vorbis_parser;  // reads the length of Vorbis packets
 
 constexpr int32_t kCodecNoMemory = -2;
 constexpr int32_t kMaxPacket = 1 << 24;  // bytes, also of set-up data
+constexpr uint8_t kVorbisSetupMark = 2;  // first byte of Vorbis set-up data: its packets minus one
 
 struct codec_library {
     // A decoder by libavcodec's name, with set-up data (copied; may be null). Null on failure.

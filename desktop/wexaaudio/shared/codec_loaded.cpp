@@ -2,10 +2,10 @@
 // of. It stays loaded until the process ends.
 #include <android/log.h>
 #include <dlfcn.h>
-#include <pthread.h>
 
 #include <cstdio>
 #include <cstring>
+#include <mutex>
 
 #include "desktop/wexaaudio/shared/codec_library.h"
 
@@ -13,7 +13,7 @@ namespace {
 
 constexpr char kName[] = "libwexaaudio_av.so";
 
-pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
+std::mutex lock;
 const codec_library *loaded;  // under lock
 
 const codec_library *load() {
@@ -37,9 +37,7 @@ const codec_library *load() {
 }  // namespace
 
 const codec_library *codec_library_get(void) {
-    pthread_mutex_lock(&lock);
+    const std::lock_guard<std::mutex> guard(lock);
     if (loaded == nullptr) loaded = load();
-    const codec_library *table = loaded;
-    pthread_mutex_unlock(&lock);
-    return table;
+    return loaded;
 }

@@ -2,15 +2,19 @@
 #ifndef WEXAAUDIO_ID3V2_H
 #define WEXAAUDIO_ID3V2_H
 
-#include "desktop/wexaaudio/shared/io_file.h"
+#include <cstdint>
+#include <cstring>
 
 constexpr int32_t kId3v2Head = 10;  // bytes, also of the footer
 
 // Total bytes of the tag that starts with these kId3v2Head bytes, footer included; 0 if it is not a
-// tag.
-int64_t id3v2_bytes(const uint8_t *p);
-
-// Offset of what follows the tags at the start of the file.
-int64_t id3v2_end(io_file *file);
+// tag. p may be null.
+inline int64_t id3v2_bytes(const uint8_t *p) {
+    if (p == nullptr || memcmp(p, "ID3", 3) != 0 || p[3] < 2 || p[3] > 4 || p[4] == 0xFF) return 0;
+    const int64_t size =
+        (p[6] & 0x7F) << 21 | (p[7] & 0x7F) << 14 | (p[8] & 0x7F) << 7 | (p[9] & 0x7F);
+    const bool footer = (p[5] & 0x10) != 0;
+    return kId3v2Head + size + (footer ? kId3v2Head : 0);
+}
 
 #endif

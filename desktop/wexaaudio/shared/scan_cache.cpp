@@ -1,19 +1,19 @@
 #include "desktop/wexaaudio/shared/scan_cache.h"
 
-#include <pthread.h>
 #include <sys/stat.h>
 
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
+#include <mutex>
 
 namespace {
 
 // A change within a tick of the file system's clock leaves the time of change as it is.
 constexpr time_t kSettled = 2;  // seconds
 
-struct alignas(max_align_t) cached_scan {  // its result follows
-    const scan_kind *kind;
+struct cached_scan : stream_info {
+    scan_function scan;
     mtsrc_file *(*open)(const mtsrc_io *io, int32_t mode);
     struct stat file;
     bool shared;  // file is known
@@ -21,7 +21,7 @@ struct alignas(max_align_t) cached_scan {  // its result follows
     cached_scan *next;
 };
 
-pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
+std::mutex lock;
 cached_scan *scans;  // under lock, as are users and next of each
 
 // False when the path does not identify what the callbacks read.
@@ -32,7 +32,7 @@ bool identify(const io_file *file, struct stat *known) {
 }
 
 bool is_same(const cached_scan &a, const cached_scan &b) {
-    return a.kind == b.kind && a.open == b.open && a.file.st_dev == b.file.st_dev &&
+    return a.scan == b.scan && a.open == b.open && a.file.st_dev == b.file.st_dev &&
            a.file.st_ino == b.file.st_ino && a.file.st_size == b.file.st_size &&
            a.file.st_ctim.tv_sec == b.file.st_ctim.tv_sec &&
            a.file.st_ctim.tv_nsec == b.file.st_ctim.tv_nsec;
@@ -40,71 +40,67 @@ bool is_same(const cached_scan &a, const cached_scan &b) {
 
 // Finds a scan like wanted and adds a user to it; null without one.
 cached_scan *find(const cached_scan &wanted) {
-    pthread_mutex_lock(&lock);
+    const std::lock_guard<std::mutex> guard(lock);
     cached_scan *c = scans;
     while (c != nullptr && !is_same(*c, wanted)) c = c->next;
     if (c != nullptr) ++c->users;
-    pthread_mutex_unlock(&lock);
     return c;
 }
 
 void release(cached_scan *c) {
-    if (c->kind->release != nullptr) c->kind->release(c + 1);
+    frame_index_free(&c->frames);
+    frame_index_free(&c->pages);
+    free(c->setup);
     free(c);
 }
 
-// Removes the scans without users, except kept, from the list. Returns them as a list of their own.
-cached_scan *remove_unused(const cached_scan *kept) {
+// Removes a user of c, then the scans without users from the list, except a kept one. Returns them
+// as a list of their own.
+cached_scan *remove_user(cached_scan *c, const cached_scan *kept) {
+    const std::lock_guard<std::mutex> guard(lock);
+    --c->users;
     cached_scan *unused = nullptr;
     for (cached_scan **link = &scans; *link != nullptr;) {
-        cached_scan *c = *link;
-        if (c->users > 0 || c == kept) {
-            link = &c->next;
+        cached_scan *each = *link;
+        if (each->users > 0 || each == kept) {
+            link = &each->next;
             continue;
         }
-        *link = c->next;
-        c->next = unused;
-        unused = c;
+        *link = each->next;
+        each->next = unused;
+        unused = each;
     }
     return unused;
 }
 
 }  // namespace
 
-const void *scan_cache_get(io_file *file, const scan_kind *kind) {
-    auto *c = static_cast<cached_scan *>(calloc(1, sizeof(cached_scan) + kind->bytes));
+const stream_info *scan_cache_get(io_file *file, scan_function scan) {
+    auto *c = static_cast<cached_scan *>(calloc(1, sizeof(cached_scan)));
     if (c == nullptr) return nullptr;
-    c->kind = kind;
+    c->scan = scan;
     c->open = file->io.open;
     c->users = 1;
     c->shared = identify(file, &c->file);
     cached_scan *other = c->shared ? find(*c) : nullptr;
-    if (other != nullptr) {
-        free(c);
-        return other + 1;
-    }
-    if (!kind->scan(file, c + 1)) {
+    if (other != nullptr || !scan(file, c)) {
         release(c);
-        return nullptr;
+        return other;
     }
     if (c->shared) {
-        pthread_mutex_lock(&lock);
+        const std::lock_guard<std::mutex> guard(lock);
         c->next = scans;
         scans = c;
-        pthread_mutex_unlock(&lock);
     }
-    return c + 1;
+    return c;
 }
 
-void scan_cache_put(const void *result) {
-    if (result == nullptr) return;
-    auto *c = static_cast<cached_scan *>(const_cast<void *>(result)) - 1;
+void scan_cache_put(const stream_info *info) {
+    if (info == nullptr) return;
+    auto *c = static_cast<cached_scan *>(const_cast<stream_info *>(info));
     if (!c->shared) return release(c);
     const bool settled = time(nullptr) > c->file.st_ctim.tv_sec + kSettled;
-    pthread_mutex_lock(&lock);
-    --c->users;
-    cached_scan *unused = remove_unused(settled ? c : nullptr);
-    pthread_mutex_unlock(&lock);
+    cached_scan *unused = remove_user(c, settled ? c : nullptr);
     while (unused != nullptr) {
         cached_scan *next = unused->next;
         release(unused);

@@ -51,20 +51,14 @@ int32_t decode_next(stream_reader *r) {
     return held;
 }
 
+// Sample frames that the source delivers.
+int64_t delivered(const stream_info *info) {
+    return std::max<int64_t>(frame_index_end(&info->frames) - info->delay, 0);
+}
+
 }  // namespace
 
-stream_reader *stream_open(const mtsrc_io *io, const scan_kind *kind) {
-    auto *r = static_cast<stream_reader *>(calloc(1, sizeof(stream_reader)));
-    if (r == nullptr) return nullptr;
-    r->fresh = true;
-    r->library = codec_library_get();
-    if (r->library != nullptr && io_file_open(&r->file, io)) {
-        r->info = static_cast<const stream_info *>(scan_cache_get(&r->file, kind));
-    }
-    if (r->info != nullptr) return r;
-    stream_close(r);
-    return nullptr;
-}
+extern "C" {
 
 void stream_close(void *reader) {
     auto *r = static_cast<stream_reader *>(reader);
@@ -75,19 +69,18 @@ void stream_close(void *reader) {
     free(r);
 }
 
-int64_t stream_duration(const stream_reader *r) {
-    const int64_t samples = frame_index_end(&r->info->frames) - r->info->delay;
-    return r->info->rate > 0 ? units_of_duration(std::max<int64_t>(samples, 0), r->info->rate) : 0;
+// A container's stream is the container itself.
+void *stream_of_track(void *reader, int32_t track, void * /*reserved*/) {
+    const auto *r = static_cast<stream_reader *>(reader);
+    return track >= 0 && track == r->info->track ? reader : nullptr;
 }
 
+// Reads the next frame that has samples: a frame that cannot be decoded becomes silence.
 int32_t stream_read(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                     int64_t *second) {
     auto *r = static_cast<stream_reader *>(reader);
-    if (r == nullptr || buf == nullptr || bytes == nullptr || first == nullptr ||
-        second == nullptr || r->info->codec == nullptr) {
-        return -1;
-    }
     const stream_info *info = r->info;
+    if (info->codec == nullptr) return -1;
     int32_t held = 0;
     int32_t samples = 0;
     for (; samples == 0; ++r->next) {
@@ -114,20 +107,59 @@ int32_t stream_read(void *reader, void *buf, int32_t size, int32_t *bytes, int64
 
 int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached) {
     auto *r = static_cast<stream_reader *>(reader);
-    if (r == nullptr || position == nullptr || reached == nullptr || r->info->codec == nullptr) {
-        return -1;
-    }
-    const frame_index *frames = &r->info->frames;
-    const int64_t end = std::max<int64_t>(frame_index_end(frames) - r->info->delay, 0);
-    const int64_t sample = seek_target(*position, end, r->info->rate);
+    const stream_info *info = r->info;
+    if (info->codec == nullptr) return -1;
+    const int64_t end = delivered(info);
+    const int64_t sample = seek_target(*position, end, info->rate);
     // The source drops samples at time 0. At any other position, in the first frame too, the
     // frame's time is not 0, so that nothing is dropped twice.
-    const int64_t decoded = sample > 0 ? sample + r->info->delay : 0;
+    const int64_t decoded = sample > 0 ? sample + info->delay : 0;
+    const frame_index *frames = &info->frames;
     r->next = sample < end ? frame_index_find(frames, decoded) : frames->count;
     r->skip = sample < end ? static_cast<int32_t>(decoded - frames->entry[r->next].first) : 0;
     r->fresh = true;
-    *reached = units_from_samples(sample, r->info->rate);
+    *reached = units_from_samples(sample, info->rate);
     return 0;
+}
+
+int32_t stream_seek_in_container(void *stream, const int64_t *position, int64_t *reached,
+                                 int32_t /*flags*/) {
+    return stream_seek(stream, position, reached);
+}
+
+// These functions of the interface differ in their names only.
+decltype(stream_read) xaacfd_get_frm [[gnu::alias("stream_read")]];
+decltype(stream_read) xmp123fd_get_frm [[gnu::alias("stream_read")]];
+decltype(stream_read) xmp4fds_get_frm [[gnu::alias("stream_read")]];
+decltype(stream_read) xoggds_get_frm [[gnu::alias("stream_read")]];
+decltype(stream_seek) xaacfd_seek [[gnu::alias("stream_seek")]];
+decltype(stream_seek) xmp123fd_seek [[gnu::alias("stream_seek")]];
+decltype(xmp4fds_seek) xmp4fds_seek [[gnu::alias("stream_seek_in_container")]];
+decltype(xoggds_seek) xoggds_seek [[gnu::alias("stream_seek_in_container")]];
+decltype(stream_close) xaacfd_delete [[gnu::alias("stream_close")]];
+decltype(stream_close) xmp123fd_delete [[gnu::alias("stream_close")]];
+decltype(stream_close) xmp4fd_delete [[gnu::alias("stream_close")]];
+decltype(stream_close) xoggd_delete [[gnu::alias("stream_close")]];
+decltype(stream_of_track) xmp4fds_open [[gnu::alias("stream_of_track")]];
+decltype(stream_of_track) xoggds_open [[gnu::alias("stream_of_track")]];
+
+}  // extern "C"
+
+stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration) {
+    auto *r = static_cast<stream_reader *>(calloc(1, sizeof(stream_reader)));
+    if (r == nullptr) return nullptr;
+    r->fresh = true;
+    r->library = codec_library_get();
+    if (r->library != nullptr && io_file_open(&r->file, io)) {
+        r->info = scan_cache_get(&r->file, scan);
+    }
+    if (r->info == nullptr) {
+        stream_close(r);
+        return nullptr;
+    }
+    const int32_t rate = r->info->rate;
+    *duration = rate > 0 ? units_of_duration(delivered(r->info), rate) : 0;
+    return r;
 }
 
 int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
@@ -145,19 +177,4 @@ int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint
         if (got < piece || done == bytes) break;
     }
     return done;
-}
-
-bool stream_set_up(stream_info *info, const uint8_t *setup, int32_t bytes) {
-    free(info->setup);
-    info->setup_bytes = bytes;
-    info->setup = static_cast<uint8_t *>(malloc(static_cast<size_t>(bytes)));
-    if (info->setup != nullptr) memcpy(info->setup, setup, static_cast<size_t>(bytes));
-    return info->setup != nullptr;
-}
-
-void stream_info_release(void *result) {
-    auto *info = static_cast<stream_info *>(result);
-    frame_index_free(&info->frames);
-    frame_index_free(&info->pages);
-    free(info->setup);
 }

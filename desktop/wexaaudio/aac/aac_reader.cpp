@@ -1,9 +1,11 @@
-#include "desktop/wexaaudio/aac/adts_scan.h"
-
+// AAC in ADTS form, after any ID3v2 tags: one scan of the frame headers at open finds every frame.
+//
+// In: mtsrc_io. Out: PCM, the information record.
 #include <cstring>
 
 #include "desktop/wexaaudio/aac/aac_stream.h"
 #include "desktop/wexaaudio/shared/id3v2.h"
+#include "media_source/wexaaudio.h"
 
 namespace {
 
@@ -96,15 +98,24 @@ bool make_config(io_file *file, const adts_header &first, const frame_entry &ent
            aac_config_from_program(config, p, entry.bytes, first.object_type, first.rate_index);
 }
 
-bool scan_file(io_file *file, void *result) {
-    auto *info = static_cast<stream_info *>(result);
+bool scan_file(io_file *file, stream_info *info) {
+    int64_t start = 0;
+    for (int64_t tag = 1; tag > 0; start += tag) {
+        tag = id3v2_bytes(io_file_bytes(file, start, kId3v2Head));
+    }
     aac_config config = {};
     adts_header first = {};
-    return scan_frames(file, id3v2_end(file), &info->frames, &first) &&
+    return scan_frames(file, start, &info->frames, &first) &&
            make_config(file, first, info->frames.entry[0], &config) &&
            aac_stream_complete(file, &config, info);
 }
 
 }  // namespace
 
-const scan_kind kAdtsScan = {sizeof(stream_info), scan_file, stream_info_release};
+void *xaacfd_create(const mtsrc_io *io, int64_t * /*word*/, xaac_info *info, void * /*reserved*/) {
+    stream_reader *r = stream_open(io, scan_file, &info->duration);
+    if (r == nullptr) return nullptr;
+    info->sample_rate = r->info->rate;
+    info->channels = r->info->channels;
+    return r;
+}

@@ -1,10 +1,12 @@
-#include "desktop/wexaaudio/mpeg/mpeg_scan.h"
-
+// Bare MPEG audio files, Layers I to III: one scan over the frame headers, past tags and garbage.
+//
+// In: mtsrc_io. Out: PCM, the information record.
 #include <algorithm>
 #include <cstring>
 
 #include "desktop/wexaaudio/mpeg/mpeg_header.h"
 #include "desktop/wexaaudio/shared/id3v2.h"
+#include "desktop/wexaaudio/shared/stream.h"
 #include "media_source/wexaaudio.h"
 
 namespace {
@@ -122,11 +124,12 @@ bool walk(mpeg_scan *s, frame_index *frames) {
     return !s->file->failed && frames->count > 0;
 }
 
-bool scan_file(io_file *file, void *result) {
-    auto *info = static_cast<stream_info *>(result);
+bool scan_file(io_file *file, stream_info *info) {
     mpeg_scan s = {file, find_end(file), 0, {}, false};
     if (!find_start(&s) || !walk(&s, &info->frames)) return false;
     mpeg_describe(&s.head, info);
+    // Positions of seeks and the duration count what the source delivers, which drops the start of
+    // the first frame. The times of the frames count what is decoded: the whole first frame has 0.
     if (s.head.rate == kDropRate && s.head.channels == 2) {
         info->delay = std::min(kWexaMpegDelay, s.head.samples);
     }
@@ -135,4 +138,11 @@ bool scan_file(io_file *file, void *result) {
 
 }  // namespace
 
-const scan_kind kMpegScan = {sizeof(stream_info), scan_file, stream_info_release};
+void *xmp123fd_create(const mtsrc_io *io, int64_t * /*word*/, xmp123_info *info,
+                      void * /*reserved*/) {
+    stream_reader *r = stream_open(io, scan_file, &info->duration);
+    if (r == nullptr) return nullptr;
+    info->sample_rate = r->info->rate;
+    info->channels = r->info->channels;
+    return r;
+}
