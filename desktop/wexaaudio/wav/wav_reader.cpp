@@ -28,22 +28,17 @@ constexpr uint8_t kSubFormatTail[14] = {0, 0, 0, 0, 0x10, 0, 0x80, 0, 0, 0xAA, 0
 
 struct wav_reader {
     io_file file;
-    int64_t data;   // offset of the first sample frame
-    int64_t total;  // sample frames
-    int64_t next;   // sample frame read next
-    int32_t block;  // bytes of a sample frame
-    int32_t rate;   // Hz
-};
-
-struct wav_head {
     bool has_format;
     bool has_data;
     int32_t tag;
     int32_t channels;
-    int64_t rate;  // Hz, 32-bit unsigned in the file
+    int32_t rate;  // Hz; below 0 when the file states 2^31 or more
     int32_t bits;
-    int64_t data;        // offset
+    int64_t data;        // offset of the first sample frame
     int64_t data_bytes;  // as present in the file
+    int32_t block;       // bytes of a sample frame
+    int64_t total;       // sample frames
+    int64_t next;        // sample frame read next
 };
 
 uint32_t le16(const uint8_t *p) {
@@ -54,31 +49,32 @@ uint32_t le32(const uint8_t *p) {
     return le16(p) | le16(p + 2) << 16;
 }
 
-void read_format(wav_head *head, const uint8_t *p, int64_t bytes) {
-    head->has_format = true;
-    head->tag = static_cast<int32_t>(le16(p));
-    head->channels = static_cast<int32_t>(le16(p + 2));
-    head->rate = le32(p + 4);
-    head->bits = static_cast<int32_t>(le16(p + 14));
-    if (head->tag == kTagExtensible && bytes >= kExtensibleBytes &&
+void read_format(wav_reader *r, const uint8_t *p, int64_t bytes) {
+    r->has_format = true;
+    r->tag = static_cast<int32_t>(le16(p));
+    r->channels = static_cast<int32_t>(le16(p + 2));
+    r->rate = static_cast<int32_t>(le32(p + 4));
+    r->bits = static_cast<int32_t>(le16(p + 14));
+    if (r->tag == kTagExtensible && bytes >= kExtensibleBytes &&
         memcmp(p + 26, kSubFormatTail, sizeof kSubFormatTail) == 0) {
-        head->tag = static_cast<int32_t>(le16(p + 24));
+        r->tag = static_cast<int32_t>(le16(p + 24));
     }
 }
 
 // A data size of 0 or of all ones was never filled in by its writer, and a file may be cut short:
 // then the rest of the file is the data.
-void read_data(wav_head *head, int64_t offset, uint32_t size, int64_t file_size) {
-    const int64_t rest = file_size - offset;
-    head->has_data = true;
-    head->data = offset;
-    head->data_bytes = rest;
-    if (size != 0 && size != kUnknownSize) head->data_bytes = std::min<int64_t>(rest, size);
+void read_data(wav_reader *r, int64_t offset, uint32_t size) {
+    const int64_t rest = r->file.size - offset;
+    r->has_data = true;
+    r->data = offset;
+    r->data_bytes = rest;
+    if (size != 0 && size != kUnknownSize) r->data_bytes = std::min<int64_t>(rest, size);
 }
 
 // Walks the chunks until both the format and the data are known. False on a read error or when the
 // file is not RIFF WAVE.
-bool read_chunks(io_file *f, wav_head *head) {
+bool read_chunks(wav_reader *r) {
+    io_file *f = &r->file;
     int32_t got = 0;
     const uint8_t *p = io_file_peek(f, 0, kRiffHead, &got);
     if (p == nullptr || got < kRiffHead || memcmp(p + 8, "WAVE", 4) != 0 ||
@@ -86,16 +82,16 @@ bool read_chunks(io_file *f, wav_head *head) {
         return false;
     }
     int64_t at = kRiffHead;
-    for (int32_t i = 0; i < kMaxChunks && !(head->has_format && head->has_data); ++i) {
+    for (int32_t i = 0; i < kMaxChunks && !(r->has_format && r->has_data); ++i) {
         p = io_file_peek(f, at, kChunkHead + kExtensibleBytes, &got);
         if (p == nullptr || got < kChunkHead) return !f->failed;
         const uint32_t size = le32(p + 4);
         const int64_t body = std::min<int64_t>(got - kChunkHead, size);
-        if (memcmp(p, "fmt ", 4) == 0 && body >= kFormatBytes && !head->has_format) {
-            read_format(head, p + kChunkHead, body);
-        } else if (memcmp(p, "data", 4) == 0 && !head->has_data) {
-            read_data(head, at + kChunkHead, size, f->size);
-            at = head->data + head->data_bytes + (head->data_bytes & 1);
+        if (memcmp(p, "fmt ", 4) == 0 && body >= kFormatBytes && !r->has_format) {
+            read_format(r, p + kChunkHead, body);
+        } else if (memcmp(p, "data", 4) == 0 && !r->has_data) {
+            read_data(r, at + kChunkHead, size);
+            at = r->data + r->data_bytes + (r->data_bytes & 1);
             continue;
         }
         at += kChunkHead + static_cast<int64_t>(size) + (size & 1);
@@ -105,47 +101,37 @@ bool read_chunks(io_file *f, wav_head *head) {
 
 // Fills in the record, which also explains a refusal. False when the header is too damaged: the
 // record stays empty.
-bool fill_info(xwav_info *info, const wav_head *head) {
-    const bool has_rate = head->rate > 0 && head->rate <= INT32_MAX;
-    if (!head->has_format || head->channels == 0 || !has_rate) return false;
-    info->codec = head->tag == kTagPcm    ? kWexaPcm
-                  : head->tag == kWexaPcm ? head->tag | kTagCollision
-                                          : head->tag;
-    info->sample_rate = static_cast<int32_t>(head->rate);
-    info->bits = head->bits;
-    info->channels = head->channels;
+bool fill_info(xwav_info *info, const wav_reader *r) {
+    if (!r->has_format || r->channels == 0 || r->rate <= 0) return false;
+    info->codec = r->tag == kTagPcm    ? kWexaPcm
+                  : r->tag == kWexaPcm ? r->tag | kTagCollision
+                                       : r->tag;
+    info->sample_rate = r->rate;
+    info->bits = r->bits;
+    info->channels = r->channels;
     return true;
 }
 
 }  // namespace
 
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t * /*word*/) {
-    auto *reader = static_cast<wav_reader *>(calloc(1, sizeof(wav_reader)));
-    if (reader == nullptr || info == nullptr || !io_file_open(&reader->file, io)) {
-        free(reader);
-        return nullptr;
-    }
-    wav_head head = {};
-    if (!read_chunks(&reader->file, &head) || !fill_info(info, &head) || !head.has_data ||
+    auto *r = static_cast<wav_reader *>(calloc(1, sizeof(wav_reader)));
+    if (r == nullptr) return nullptr;
+    if (!io_file_open(&r->file, io) || !read_chunks(r) || !fill_info(info, r) || !r->has_data ||
         info->codec != kWexaPcm || info->bits != kSampleBytes * CHAR_BIT) {
-        xwavd_delete(reader);
+        xwavd_delete(r);
         return nullptr;
     }
-    reader->rate = info->sample_rate;
-    reader->block = head.channels * kSampleBytes;
-    reader->data = head.data;
-    reader->total = std::min(head.data_bytes / reader->block, kMaxSamples);
-    info->duration = units_of_duration(reader->total, reader->rate);
-    return reader;
+    r->block = r->channels * kSampleBytes;
+    r->total = std::min(r->data_bytes / r->block, kMaxSamples);
+    info->duration = units_of_duration(r->total, r->rate);
+    return r;
 }
 
 int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                       int64_t *second) {
     auto *r = static_cast<wav_reader *>(reader);
-    if (r == nullptr || buf == nullptr || bytes == nullptr || first == nullptr ||
-        second == nullptr || size < r->block) {
-        return -1;
-    }
+    if (size < r->block) return -1;
     const int64_t frames = std::min<int64_t>(size / r->block, r->total - r->next);
     if (frames <= 0) return kWexaEndOfStream;
     const int64_t got =
@@ -161,7 +147,6 @@ int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int
 
 int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32_t /*flags*/) {
     auto *r = static_cast<wav_reader *>(reader);
-    if (r == nullptr || seconds == nullptr || reached == nullptr) return -1;
     const int64_t wanted = std::max<int64_t>(*seconds, 0);
     r->next = wanted > r->total / r->rate ? r->total : std::min(wanted * r->rate, r->total);
     *reached = units_from_samples(r->next, r->rate);
@@ -169,8 +154,6 @@ int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32
 }
 
 void xwavd_delete(void *reader) {
-    auto *r = static_cast<wav_reader *>(reader);
-    if (r == nullptr) return;
-    io_file_close(&r->file);
-    free(r);
+    io_file_close(&static_cast<wav_reader *>(reader)->file);
+    free(reader);
 }
