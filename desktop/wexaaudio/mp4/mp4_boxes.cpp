@@ -26,6 +26,7 @@ constexpr uint32_t name_of(const char (&text)[5]) {
 struct span {
     int64_t from;
     int64_t to;
+    int32_t boxes = 0;  // read from the level so far
 };
 
 struct box {
@@ -50,12 +51,16 @@ struct parser {
     bool ended;  // a frame was past the end of the file: the list ends before it
 };
 
-// Unsigned, big-endian; 0 where the file has no such bytes.
-uint64_t number(io_file *file, int64_t offset, int32_t bytes) {
-    const uint8_t *p = io_file_bytes(file, offset, bytes);
+// Unsigned, big-endian; 0 when p is null.
+uint64_t big_endian(const uint8_t *p, int32_t bytes) {
     uint64_t v = 0;
     for (int32_t i = 0; p != nullptr && i < bytes; ++i) v = v << 8 | p[i];
     return v;
+}
+
+// 0 where the file has no such bytes.
+uint64_t number(io_file *file, int64_t offset, int32_t bytes) {
+    return big_endian(io_file_bytes(file, offset, bytes), bytes);
 }
 
 uint32_t be32(io_file *file, int64_t offset) {
@@ -66,7 +71,7 @@ uint32_t be32(io_file *file, int64_t offset) {
 // ends with it. False when there is none.
 bool next_box(io_file *file, span *level, box *b) {
     const int64_t left = level->to - level->from;
-    if (left < 8) return false;
+    if (left < 8 || level->boxes++ == kMaxBoxes) return false;
     uint64_t size = be32(file, level->from);
     int64_t head = 8;
     if (size == 1) {
@@ -82,13 +87,18 @@ bool next_box(io_file *file, span *level, box *b) {
     return true;
 }
 
+// Removes the boxes up to the next one of a name.
+bool next_named(io_file *file, span *level, uint32_t name, box *b) {
+    while (next_box(file, level, b)) {
+        if (b->name == name) return true;
+    }
+    return false;
+}
+
 // The first box of a name in a level.
 span find(io_file *file, span level, uint32_t name) {
     box b = {};
-    for (int32_t i = 0; i < kMaxBoxes && next_box(file, &level, &b); ++i) {
-        if (b.name == name) return b.body;
-    }
-    return {0, 0};
+    return next_named(file, &level, name, &b) ? b.body : span{0, 0};
 }
 
 template <typename... Names>
@@ -172,12 +182,10 @@ table load(io_file *file, span body) {
     return t;
 }
 
-// Unsigned, big-endian, of width bytes; 0 past the end.
+// 0 past the end.
 int64_t value(const table &t, int64_t at, int32_t width) {
-    uint64_t v = 0;
-    if (at < 0 || at + width > t.bytes) return 0;
-    for (int32_t i = 0; i < width; ++i) v = v << 8 | t.data[at + i];
-    return static_cast<int64_t>(v);
+    const bool inside = at >= 0 && at + width <= t.bytes;
+    return static_cast<int64_t>(big_endian(inside ? t.data + at : nullptr, width));
 }
 
 // The tables of a track: how many frames each chunk has, where the chunks are, the frames' sizes.
@@ -245,8 +253,7 @@ bool read_tables(parser *p, span stbl) {
 // Reads the tracks' defaults of fragments from the box "mvex".
 void read_defaults(parser *p, span mvex) {
     box trex = {};
-    for (int32_t i = 0; i < kMaxBoxes && next_box(p->file, &mvex, &trex); ++i) {
-        if (trex.name != name_of("trex") || p->default_count == kMaxTracks) continue;
+    while (p->default_count < kMaxTracks && next_named(p->file, &mvex, name_of("trex"), &trex)) {
         const int64_t at = trex.body.from + kFullHead;
         p->defaults[p->default_count++] = {be32(p->file, at), be32(p->file, at + 12)};
     }
@@ -304,8 +311,7 @@ bool read_track_runs(parser *p, int64_t moof, span traf, int64_t *offset) {
     const int64_t base = std::clamp<int64_t>(*offset, 0, file->size);
     *offset = base;
     box run = {};
-    for (int32_t i = 0; i < kMaxBoxes && next_box(file, &traf, &run); ++i) {
-        if (run.name != name_of("trun")) continue;
+    while (next_named(file, &traf, name_of("trun"), &run)) {
         if (!read_run(p, run.body, track_id == p->track_id, base, size, offset)) return false;
     }
     return true;
@@ -315,8 +321,7 @@ bool read_fragment(parser *p, const box &moof) {
     span level = moof.body;
     int64_t offset = moof.start;
     box traf = {};
-    for (int32_t i = 0; i < kMaxBoxes && next_box(p->file, &level, &traf); ++i) {
-        if (traf.name != name_of("traf")) continue;
+    while (next_named(p->file, &level, name_of("traf"), &traf)) {
         if (!read_track_runs(p, moof.start, traf.body, &offset)) return false;
     }
     return true;
@@ -328,8 +333,7 @@ bool read_movie(parser *p, span moov) {
     stream_info *info = p->info;
     box trak = {};
     span level = moov;
-    for (int32_t i = 0; i < kMaxBoxes && next_box(file, &level, &trak); ++i) {
-        if (trak.name != name_of("trak") || info->track_count == kMaxTracks) continue;
+    while (info->track_count < kMaxTracks && next_named(file, &level, name_of("trak"), &trak)) {
         const int32_t track = info->track_count++;
         const span media = find(file, trak.body, name_of("mdia"));
         const span handler = find(file, media, name_of("hdlr"));
@@ -362,10 +366,10 @@ bool mp4_read_boxes(io_file *file, stream_info *info, mp4_codec *codec) {
     info->track = -1;
     if (moov.to == 0 || !read_movie(&p, moov)) return false;
     if (!codec->is_aac && !codec->is_mpeg) return !file->failed;
-    box b = {};
+    box moof = {};
     span level = all;
-    for (int32_t i = 0; i < kMaxBoxes && !p.ended && next_box(file, &level, &b); ++i) {
-        if (b.name == name_of("moof") && !read_fragment(&p, b)) return false;
+    while (!p.ended && next_named(file, &level, name_of("moof"), &moof)) {
+        if (!read_fragment(&p, moof)) return false;
     }
     return !file->failed;
 }
