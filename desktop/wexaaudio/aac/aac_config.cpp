@@ -9,23 +9,22 @@ constexpr int32_t kRates[] = {96000, 88200, 64000, 48000, 44100, 32000, 24000,
 constexpr int32_t kRateCount = sizeof kRates / sizeof kRates[0];
 constexpr int32_t kMixdownBits[] = {4, 4, 3};  // mono, stereo, matrix
 constexpr int32_t kIdentifierBits = 3;         // of an element in a raw block
+constexpr int32_t kPlainBytes = 2;             // of a configuration without more elements
 constexpr int32_t kRateEscape = 15;            // 24 bits of Hz follow
 constexpr int32_t kObjectEscape = 31;          // 6 more bits follow
 
 struct bit_reader {
     const uint8_t *data;
     int64_t bits;  // in data
-    int64_t at;
-    bool failed;  // read past the end
+    int64_t at;    // beyond bits once more was read than there is
 };
 
+// Bits past the end are 0.
 uint32_t get(bit_reader *r, int32_t count) {
     uint32_t value = 0;
-    for (int32_t i = 0; i < count; ++i) {
-        r->failed = r->failed || r->at >= r->bits;
-        if (r->failed) return 0;
-        value = value << 1 | (static_cast<uint32_t>(r->data[r->at / 8]) >> (7 - r->at % 8) & 1U);
-        ++r->at;
+    for (const int64_t end = r->at + count; r->at < end; ++r->at) {
+        const uint32_t byte = r->at < r->bits ? r->data[r->at / 8] : 0;
+        value = value << 1 | (byte >> (7 - r->at % 8) & 1U);
     }
     return value;
 }
@@ -68,25 +67,17 @@ int32_t aac_rate_of_index(int32_t index) {
 
 void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index,
                      int32_t channels) {
-    *config = {};
-    config->object_type = object_type;
-    config->rate_index = rate_index;
-    config->channels = channels;
+    *config = {{}, kPlainBytes, object_type, rate_index, channels, false};
     bit_writer w = {config->bytes, 0};
     put_core(&w, *config);
     put_general(&w, *config);
-    config->size = static_cast<int32_t>((w.at + 7) / 8);
 }
 
 bool aac_config_from_program(aac_config *config, const uint8_t *data, int32_t bytes,
                              int32_t object_type, int32_t rate_index) {
-    *config = {};
-    config->object_type = object_type;
-    config->rate_index = rate_index;
-    bit_reader r = {data, static_cast<int64_t>(bytes) * 8, kIdentifierBits, false};
-    bit_writer w = {config->bytes, 0};
-    put_core(&w, *config);
-    put_general(&w, *config);
+    aac_config_make(config, object_type, rate_index, 0);
+    bit_reader r = {data, int64_t{bytes} * 8, kIdentifierBits};
+    bit_writer w = {config->bytes, kPlainBytes * 8};
     copy(&r, &w, 10);  // instance tag, object type, rate index
     const uint32_t front = copy(&r, &w, 4);
     const uint32_t side = copy(&r, &w, 4);
@@ -105,7 +96,7 @@ bool aac_config_from_program(aac_config *config, const uint8_t *data, int32_t by
     w.at = (w.at + 7) / 8 * 8;
     put(&w, 0, 8);
     config->size = static_cast<int32_t>(w.at / 8);
-    return !r.failed && r.at <= r.bits;
+    return r.at <= r.bits;
 }
 
 bool aac_config_read(aac_config *config, const void *data, int32_t bytes) {
@@ -113,7 +104,7 @@ bool aac_config_read(aac_config *config, const void *data, int32_t bytes) {
     if (data == nullptr || bytes < 2 || bytes > kAacMaxConfig) return false;
     memcpy(config->bytes, data, static_cast<size_t>(bytes));
     config->size = bytes;
-    bit_reader r = {config->bytes, static_cast<int64_t>(bytes) * 8, 0, false};
+    bit_reader r = {config->bytes, int64_t{bytes} * 8, 0};
     config->object_type = static_cast<int32_t>(get(&r, 5));
     if (config->object_type == kObjectEscape) {
         config->object_type = 32 + static_cast<int32_t>(get(&r, 6));
@@ -122,7 +113,7 @@ bool aac_config_read(aac_config *config, const void *data, int32_t bytes) {
     if (config->rate_index == kRateEscape) get(&r, 24);
     config->channels = static_cast<int32_t>(get(&r, 4));
     config->short_frames = config->object_type == kAacLowComplexity && get(&r, 1) != 0;
-    return !r.failed;
+    return r.at <= r.bits;
 }
 
 void aac_config_make_sbr(aac_config *config, bool parametric) {
