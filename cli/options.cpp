@@ -36,8 +36,8 @@ constexpr const char *kFooter =
     "\n"
     "The start of a highlight is exact to 0.4 s where the loud passage is louder\n"
     "than about -13 dBFS RMS; elsewhere it is a point of a 2 s grid, usually 2 to\n"
-    "6 s early, and the text says \"about\". In mode both the tempo is that of the\n"
-    "music from the highlight on.\n"
+    "6 s early, and the text says \"about\"; --normalize refines it. In mode both\n"
+    "the tempo is that of the music from the highlight on.\n"
     "\n"
     "Exit status: 0 all done; 1 a file failed; 2 wrong usage; 130 stopped with\n"
     "Ctrl-C; 141 the reader of the results has gone.\n";
@@ -204,6 +204,9 @@ void declare_analysis(CLI::App &app, options &out, raw_values &raw) {
                    "Give up a file whose analysis takes longer; by default none is given up")
         ->check(whole(0, kMostSeconds, " of seconds"))
         ->type_name("SECONDS");
+    app.add_flag("--normalize", out.normalize,
+                 "Refine the highlight of a quiet song: search it again, raised in level; needs "
+                 "ffmpeg");
     app.add_flag("--no-ffmpeg", raw.no_ffmpeg,
                  "Decode nothing with the ffmpeg program, even if it is installed");
 }
@@ -349,6 +352,15 @@ std::string clip_contradiction(const options &out) {
     return stem(name) != name ? "" : "--clip needs a folder, or a name with an ending: clip.mp3.";
 }
 
+std::string normalize_contradiction(const options &out) {
+    if (!out.normalize) return "";
+    if (out.mode == TAVO_MODE_BEATS)
+        return "--normalize needs a highlight: --mode highlight or both.";
+    if (!out.store.empty())
+        return "--normalize does not go with --store, which keeps no such results.";
+    return out.ffmpeg.empty() ? "--normalize needs the ffmpeg program, which was not found." : "";
+}
+
 // Returns the error in a combination of valid options; empty if there is none.
 std::string contradiction(const options &out, const raw_values &raw) {
     const bool list_on_stdin =
@@ -382,8 +394,11 @@ std::string contradiction(const options &out, const raw_values &raw) {
     if (out.embed && out.report.empty()) return "--embed is about --report.";
     if (!out.click.empty() && out.click == out.report) return "--click and --report name one file.";
     if (!out.click.empty() && !takes_one_file(out)) return "--click takes exactly one audio file.";
-    const std::string about_clip = clip_contradiction(out);
-    return about_clip.empty() ? catalogue_contradiction(out) : about_clip;
+    for (const auto contradicts : {normalize_contradiction, clip_contradiction}) {
+        const std::string sentence = contradicts(out);
+        if (!sentence.empty()) return sentence;
+    }
+    return catalogue_contradiction(out);
 }
 
 // Says which options do other than a newcomer may expect.
@@ -446,8 +461,9 @@ std::optional<int> parse_options(int argc, char **argv, options &out) {
     }
     set_values(raw, out);
     std::string sentence = contradiction(out, raw);
-    if (sentence.empty() && !raw.shard.empty())
+    if (sentence.empty() && !raw.shard.empty()) {
         sentence = read_shard(raw.shard, out.share).sentence;
+    }
     if (!sentence.empty()) return wrong_usage(sentence);
     write_notes(out);
     return std::nullopt;

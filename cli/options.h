@@ -53,6 +53,7 @@ struct options {
     bool recursive = false;
     int32_t jobs = 1;
     int32_t timeout_s = 0;            // of one file's analysis, 0 for none
+    bool normalize = false;           // coarse highlights are refined in the raised song
     std::string ffmpeg;               // path of the program, empty to do without
     char list_separator = '\n';       // of the lists that name files
     std::vector<std::string> lists;   // files that name files, "-" for standard input

@@ -27,7 +27,7 @@ _tavo() {
         *)
             if [[ $word == -* ]]; then
                 mapfile -t COMPREPLY < <(compgen -W '-h --help --version
-                    -m --mode -l --length --max-beats --max-minutes -j --jobs --timeout --no-ffmpeg
+                    -m --mode -l --length --max-beats --max-minutes -j --jobs --timeout --normalize --no-ffmpeg
                     -f --format --print -o --output-dir --fps --force --skip-existing --click --clip --fade --report --embed -q --quiet
                     -r --recursive --files-from -0 --null
                     --store --retry-failed --redo --from-store --failed --patience --shard' -- "$word")

@@ -10,6 +10,7 @@ _arguments -s -S \
   '--max-minutes=[refuse audio that lasts longer]:number:' \
   '(-j --jobs)'{-j+,--jobs=}'[files analysed at once]:number:' \
   '--timeout=[give up a file whose analysis takes longer]:number:' \
+  '--normalize[refine the highlight of a quiet song]' \
   '--no-ffmpeg[decode nothing with the ffmpeg program]' \
   '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive llc ffmetadata edl fcpxml otio reaper)' \
   '(-o --output-dir)'{-o+,--output-dir=}'[folder for the marker files]:folder:_files -/' \

@@ -83,9 +83,10 @@ int64_t size_of_file(const std::string &path, int fd) {
 }
 
 // Without tags the header has a fixed size.
-std::vector<std::string> wav_output(int32_t rate) {
-    std::vector<std::string> words = {"-map",      "0:a:0", "-af",       kPlayerTimeFilter, "-ac",
-                                      "1",         "-c:a",  "pcm_s16le", "-map_metadata",   "-1",
+std::vector<std::string> wav_output(const std::string &filter, int32_t rate) {
+    const std::string filters = kPlayerTimeFilter + filter;
+    std::vector<std::string> words = {"-map",      "0:a:0", "-af",       filters,         "-ac",
+                                      "1",         "-c:a",  "pcm_s16le", "-map_metadata", "-1",
                                       "-bitexact", "-f",    "wav"};
     if (rate > 0) words.insert(words.end(), {"-ar", std::to_string(rate)});
     words.emplace_back("pipe:1");
@@ -109,11 +110,13 @@ failure decode_with_ffmpeg(const ffmpeg_limits &limits, const std::string &path,
     if (sound_fd < 0) return {system_sentence("The decoded sound cannot be held in memory", errno)};
     const int64_t file_bytes = size_of_file(path, fd);
     decoding sound{sound_fd, limits.minutes, file_bytes, "", 0, 0};
-    failure failed = decode_once({limits.program, path, fd, wav_output(0)}, stop_fd, sound);
+    failure failed =
+        decode_once({limits.program, path, fd, wav_output(limits.filter, 0)}, stop_fd, sound);
     const int32_t accepted = std::clamp<int32_t>(sound.rate, TAVO_MIN_RATE, TAVO_MAX_RATE);
     if (sound.rate > 0 && sound.rate != accepted) {
         sound = {sound_fd, limits.minutes, file_bytes, "", 0, 0};
-        failed = decode_once({limits.program, path, fd, wav_output(accepted)}, stop_fd, sound);
+        failed = decode_once({limits.program, path, fd, wav_output(limits.filter, accepted)},
+                             stop_fd, sound);
     }
     if (!failed && sound.rate == 0) failed = {"ffmpeg decodes nothing of it."};
     if (!failed) return {};

@@ -13,6 +13,7 @@
 struct ffmpeg_limits {
     std::string program;  // path of ffmpeg
     int64_t minutes = 0;  // of sound at most
+    std::string filter;   // further filters of ffmpeg, after a comma; or empty
 };
 
 // Decodes the first audio stream of path, or of fd when not negative, into sound_fd, a new

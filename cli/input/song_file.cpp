@@ -13,6 +13,7 @@
 
 #include "cli/input/explain.h"
 #include "cli/input/ffmpeg.h"
+#include "cli/input/recognise.h"
 #include "cli/input/short_path.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
@@ -98,10 +99,28 @@ failure decode_song(const std::string &path, const options &opts, int stop_fd, s
         return {"ffmpeg, which may read it, is not installed or is switched off."};
     }
     int sound_fd = -1;
-    const ffmpeg_limits limits = {opts.ffmpeg, opts.max_minutes};
-    if (failure failed = decode_with_ffmpeg(limits, path, song.fd, stop_fd, sound_fd))
+    const ffmpeg_limits limits = {opts.ffmpeg, opts.max_minutes, ""};
+    if (failure failed = decode_with_ffmpeg(limits, path, song.fd, stop_fd, sound_fd)) {
         return failed;
+    }
     song = {"/proc/self/fd/" + std::to_string(sound_fd), sound_fd, song.fd, true};
+    return {};
+}
+
+failure raise_song(const std::string &path, const options &opts, int stop_fd, const song_file &song,
+                   double gain, double offset_ms, song_file &raised) {
+    file_kind kind = file_kind::unknown;
+    if (!song.by_ffmpeg) recognise(song.path, kind);
+    const bool is_mean =  // of all channels; the library reads the first one of other files
+        song.by_ffmpeg || kind == file_kind::mpeg || kind == file_kind::ogg;
+    std::string filter = is_mean ? "" : ",pan=mono|c0=c0";
+    filter += ",volume=" + std::to_string(gain) + ":precision=double";
+    if (offset_ms > 0.0) filter += ",adelay=" + std::to_string(offset_ms) + ":all=1";
+    if (offset_ms < 0.0) filter += ",atrim=start=" + std::to_string(-offset_ms / 1000.0);
+    const ffmpeg_limits limits = {opts.ffmpeg, opts.max_minutes, filter};
+    int fd = song.by_ffmpeg ? song.source_fd : song.fd;
+    if (failure failed = decode_with_ffmpeg(limits, path, fd, stop_fd, fd)) return failed;
+    raised = {"/proc/self/fd/" + std::to_string(fd), fd, -1, true};
     return {};
 }
 

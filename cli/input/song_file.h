@@ -29,6 +29,12 @@ bool needs_ffmpeg(const song_file &song);
 // as before.
 failure decode_song(const std::string &path, const options &opts, int stop_fd, song_file &song);
 
+// Decodes the song at path, which is open as song, with ffmpeg into a second one: the channel that
+// the library analyses, from offset_ms before the player's time 0, each sample multiplied by gain
+// and saturated. After a failure there is nothing to close.
+failure raise_song(const std::string &path, const options &opts, int stop_fd, const song_file &song,
+                   double gain, double offset_ms, song_file &raised);
+
 // Harmless when called twice.
 void close_song(song_file &song);
 

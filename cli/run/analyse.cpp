@@ -5,8 +5,10 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <atomic>
 #include <cerrno>
+#include <cmath>
 
 #include "cli/input/explain.h"
 #include "cli/input/ffmpeg_process.h"
@@ -16,6 +18,10 @@
 #include "include/tavo.h"
 
 namespace {
+
+// Mean square to which --normalize raises the loudest 6 s, full scale 1: -8 dBFS, at which the
+// library refines a highlight after any rise of 3 dB.
+constexpr double kRaisedPower = 0.1585;
 
 // Set by the callback on the thread of the job: the pointer hands over the result, the pipe wakes
 // the waiting thread.
@@ -44,6 +50,14 @@ void read_stream(const TAVO_CTX *ctx, record &out) {
     out.has_stream = true;
 }
 
+// Mean square of the loudest window, full scale 1; 0 in mode beats.
+double loudest_passage(const TAVO_CTX *ctx) {
+    int32_t count = 0;
+    const float *curve = tavo_get_loudness(ctx, &count);
+    if (count == 0) return 0.0;
+    return std::pow(10.0, *std::max_element(curve, curve + count) / 10.0) - 1.0;
+}
+
 // Call it after the callback, when the job no longer changes the instance.
 void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
     if (tavo_has_audio(ctx) == 0) {
@@ -56,6 +70,7 @@ void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
     }
     out.has_highlight = out.mode != TAVO_MODE_BEATS;
     out.hl_pos_ms = info->hl_pos;
+    out.loudest = loudest_passage(ctx);
     if (info->status != 0) {
         out.error = out.mode == TAVO_MODE_BOTH
                         ? "No beats were found after the highlight."
@@ -100,6 +115,38 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
     close(done_pipe[1]);
 }
 
+void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out);
+
+// Replaces a coarse highlight by that of the song raised in level. Mode both does not show whether
+// its highlight is coarse, so there the song is searched again.
+void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record &out) {
+    options search = opts;
+    search.mode = TAVO_MODE_HIGHLIGHT;
+    search.normalize = false;
+    record found = out;
+    found.mode = search.mode;
+    if (opts.mode != search.mode) analyse_opened(search, stop_fd, song, found);
+    failure failed = {found.error};
+    if (!failed) {
+        if (is_refined(found) || found.loudest <= 0.0 || found.loudest >= kRaisedPower) return;
+        const double gain = std::sqrt(kRaisedPower / found.loudest);
+        song_file raised;
+        failed = raise_song(out.file, opts, stop_fd, song, gain, out.offset_ms, raised);
+        if (!failed) analyse_opened(search, stop_fd, raised, found);
+        close_song(raised);
+        if (!failed) failed = {found.error};
+    }
+    if (failed) {
+        out.status = is_stop_requested(stop_fd) ? outcome::stopped : outcome::failed;
+        out.error = "The song could not be raised in level. " + failed.sentence;
+        return;
+    }
+    out.raised = true;
+    out.hl_pos_ms = found.hl_pos_ms;
+    std::vector<float> &beats = out.beats_ms;
+    beats.erase(beats.begin(), std::lower_bound(beats.begin(), beats.end(), out.hl_pos_ms));
+}
+
 void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out) {
     const TAVO_PARAM param = {song.path.c_str(), opts.mode};
     int32_t code = TAVO_OK;
@@ -107,6 +154,8 @@ void analyse_opened(const options &opts, int stop_fd, song_file &song, record &o
     if (ctx != nullptr) {
         run_job(ctx, opts, stop_fd, out);
         out.offset_ms = find_player_offset_ms(song.path, out.sample_rate, out.channels);
+        const bool has_result = out.status == outcome::ok && out.has_highlight;
+        if (opts.normalize && has_result) refine_quiet_song(opts, stop_fd, song, out);
         return;
     }
     failure failed;

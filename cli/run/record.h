@@ -28,6 +28,8 @@ struct record {
     bool has_highlight = false;
     int32_t hl_pos_ms = 0;
     int32_t length_s = 0;  // requested length of the highlight, 0 for none
+    double loudest = 0.0;  // mean square of the loudest 6 s, full scale 1
+    bool raised = false;   // the highlight is that of the song raised in level, --normalize
 
     bool has_beats = false;
     int32_t bpm = 0;

@@ -26,6 +26,7 @@ std::string json_record(const record &result) {
             object["hl_end_ms"] = std::llround(highlight_end_ms(result, result.length_s));
         }
         if (has_refinement(result)) object["hl_refined"] = is_refined(result);
+        if (result.raised) object["hl_normalized"] = true;
     }
     if (result.has_beats) {
         object["bpm"] = result.bpm;
@@ -50,6 +51,7 @@ record record_from_json(const std::string &text) {
     out.decoder = object.value("decoder", "");
     out.has_highlight = object.contains("hl_pos_ms");
     out.hl_pos_ms = object.value("hl_pos_ms", 0);
+    out.raised = object.value("hl_normalized", false);
     out.has_beats = object.contains("bpm");
     out.bpm = object.value("bpm", 0);
     if (out.has_beats) out.beats_ms = object.at("beats_ms").get<std::vector<float>>();

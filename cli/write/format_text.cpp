@@ -4,6 +4,9 @@
 
 namespace {
 
+// Mean square of -10 dBFS, full scale 1: the library refines louder passages.
+constexpr double kRefinedPower = 0.1;
+
 std::string beats_lines(const record &result) {
     std::string lines = "  tempo      " + tempo_text(result) + "\n";
     lines += "  beats      " + std::to_string(result.beats_ms.size());
@@ -22,7 +25,12 @@ std::string text_record(const record &result) {
                        clock_text(static_cast<double>(result.duration_ms)) + ", " +
                        std::to_string(result.sample_rate) + " Hz, " +
                        count_text(static_cast<size_t>(result.channels), "channel") + "\n";
-    if (result.has_highlight) text += "  highlight  " + highlight_text(result) + "\n";
+    if (result.has_highlight) {
+        const bool is_quiet = result.loudest > 0.0 && result.loudest < kRefinedPower;
+        const bool is_coarse = has_refinement(result) && !is_refined(result) && !result.raised;
+        text += "  highlight  " + highlight_text(result);
+        text += is_coarse && is_quiet ? " (--normalize refines)\n" : "\n";
+    }
     if (result.has_beats) text += beats_lines(result);
     return text;
 }

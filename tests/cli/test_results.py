@@ -25,6 +25,8 @@ USAGE = [
     ("--embed a.wav", "--report"), ("--fade 1 a.wav", "about --clip"), ("--clip c.mp3 a.wav", "needs --length"),
     ("--clip c.mp3 -l 9 .", "a folder for the clips"), ("--clip c -l 9 a.wav", "an ending"),
     ("--clip c.mp3 -l 9 --fade 5 a.wav", "at most half"), ("--clip c.mp3 -l 9 --no-ffmpeg a.wav", "needs the ffmpeg"),
+    ("--normalize --no-ffmpeg a.wav", "needs the ffmpeg"), ("--normalize -m beats a.wav", "needs a highlight"),
+    ("--normalize --store a.db a.wav", "does not go with --store"),
 ]
 REFUSED = {  # content when it is a file of ours, a part of the sentence
     "empty.wav": (b"", "empty"),
@@ -109,7 +111,14 @@ class Results(Case):
             (result,) = self.run_json("--mode", "highlight", "a.wav")
             self.assertEqual((result["hl_refined"], result["hl_pos_ms"] % 2000 != 0), (refined, refined))
             text = self.run_tavo("--mode", "highlight", "a.wav").stdout.decode()
-            self.assertEqual(f"highlight  about 0:{result['hl_pos_ms'] // 1000:02}\n" in text, not refined, text)
+            about = f"highlight  about 0:{result['hl_pos_ms'] // 1000:02} (--normalize refines)\n"
+            self.assertEqual(about in text, not refined, text)
+            for mode in ("highlight", "both"):
+                (raised,) = self.run_json("--mode", mode, "--normalize", "a.wav")
+                self.assertEqual(raised.get("hl_normalized", False), not refined)
+                if mode == "highlight" or not refined:
+                    self.assertAlmostEqual(raised["hl_pos_ms"], 20000, delta=400)
+                self.assertTrue(all(beat >= raised["hl_pos_ms"] for beat in raised.get("beats_ms", ())))
 
     def test_refused_files(self):
         os.mkfifo(self.folder / "pipe")
