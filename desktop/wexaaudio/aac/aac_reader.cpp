@@ -89,13 +89,11 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
 // given there.
 bool make_config(io_file *file, const adts_header &first, const frame_entry &entry,
                  aac_config *config) {
-    if (first.channels != 0) {
-        aac_config_make(config, first.object_type, first.rate_index, first.channels);
-        return true;
-    }
+    aac_config_make(config, first.object_type, first.rate_index, first.channels);
+    if (first.channels != 0) return true;
     const uint8_t *p = io_file_bytes(file, entry.offset, entry.bytes);
     return p != nullptr && entry.bytes > 0 && p[0] >> 5 == kProgramElement &&
-           aac_config_from_program(config, p, entry.bytes, first.object_type, first.rate_index);
+           aac_config_add_program(config, p, entry.bytes);
 }
 
 bool scan_file(io_file *file, stream_info *info) {

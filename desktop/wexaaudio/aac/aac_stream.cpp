@@ -6,6 +6,15 @@
 
 namespace {
 
+constexpr int32_t kRates[] = {96000, 88200, 64000, 48000, 44100, 32000, 24000,
+                              22050, 16000, 12000, 11025, 8000,  7350};
+constexpr int32_t kRateCount = sizeof kRates / sizeof kRates[0];
+constexpr int32_t kMixdownBits[] = {4, 4, 3};  // mono, stereo, matrix
+constexpr int32_t kIdentifierBits = 3;         // of an element in a raw block
+constexpr int32_t kPlainBytes = 2;             // of a configuration without more elements
+constexpr int32_t kRateEscape = 15;            // 24 bits of Hz follow
+constexpr int32_t kObjectEscape = 31;          // 6 more bits follow
+
 // The core of a stream with spectral band replication has at most half of 48,000 Hz.
 constexpr int32_t kMaxSbrCore = 24000;
 constexpr int32_t kSbrFrames = 8;     // decoded in search of band replication; usually all have it
@@ -14,8 +23,9 @@ constexpr int32_t kTriedFrames = 64;  // frames tried until one decodes at all
 constexpr int32_t kMaxFrameSamples = 4096;  // as 16-bit pairs well within a source's frame buffer
 constexpr int32_t kMaxBlockBytes = 8191;    // what an ADTS header can state, beyond any real block
 
-// Opening a decoder costs as much as decoding several frames, which favours large groups; a seek
-// decodes half a group on average, which favours small ones.
+// A decoder's noise generator carries history, so that each group of frames has a fresh one.
+// Opening it costs as much as decoding several frames, which favours large groups; a seek decodes
+// half a group on average, which favours small ones.
 //
 // One frame suffices for the overlap of low complexity. Band replication has filters and envelopes
 // with a longer memory, and its header may come with every tenth frame only: with a preroll of 8
@@ -24,6 +34,72 @@ constexpr int32_t kMaxBlockBytes = 8191;    // what an ADTS header can state, be
 constexpr int32_t kGroup = 256;
 constexpr int32_t kPreroll = 1;
 constexpr int32_t kLongPreroll = 12;
+
+struct bit_reader {
+    const uint8_t *data;
+    int64_t bits;  // in data
+    int64_t at;    // beyond bits once more was read than there is
+};
+
+// Bits past the end are 0.
+uint32_t get(bit_reader *r, int32_t count) {
+    uint32_t value = 0;
+    for (const int64_t end = r->at + count; r->at < end; ++r->at) {
+        const uint32_t byte = r->at < r->bits ? r->data[r->at / 8] : 0;
+        value = value << 1 | (byte >> (7 - r->at % 8) & 1U);
+    }
+    return value;
+}
+
+struct bit_writer {
+    uint8_t *data;  // zeroed
+    int64_t at;     // never past kAacMaxConfig * 8: the longest element written has 400 bits
+};
+
+uint32_t put(bit_writer *w, uint32_t value, int32_t count) {
+    for (int32_t i = count - 1; i >= 0; --i) {
+        const uint32_t bit = value >> i & 1U;
+        w->data[w->at / 8] = static_cast<uint8_t>(w->data[w->at / 8] | bit << (7 - w->at % 8));
+        ++w->at;
+    }
+    return value;
+}
+
+// Copies count bits and returns them.
+uint32_t copy(bit_reader *r, bit_writer *w, int32_t count) {
+    return put(w, get(r, count), count);
+}
+
+void put_core(bit_writer *w, const aac_config &config) {
+    put(w, static_cast<uint32_t>(config.object_type), 5);
+    put(w, static_cast<uint32_t>(config.rate_index), 4);
+    put(w, static_cast<uint32_t>(config.channels), 4);
+}
+
+void put_general(bit_writer *w, const aac_config &config) {
+    put(w, config.short_frames ? 1 : 0, 1);
+    put(w, 0, 2);  // no core coder, no extension
+}
+
+// States explicitly that the stream carries spectral band replication (and, parametric, stereo from
+// one channel). Without that, a decoder that starts at a frame without such data never applies it.
+// A configuration that is not a plain low-complexity one is left unchanged.
+void state_sbr(aac_config *config, bool parametric) {
+    // The output's rate is twice the core's: three places up in the table.
+    const int32_t extension = config->rate_index - 3;
+    if (config->object_type != kAacLowComplexity || config->channels == 0 ||
+        aac_rate_of_index(extension) != 2 * aac_rate_of_index(config->rate_index)) {
+        return;
+    }
+    config->object_type = parametric ? kAacPs : kAacSbr;
+    memset(config->bytes, 0, sizeof config->bytes);
+    bit_writer w = {config->bytes, 0};
+    put_core(&w, *config);
+    put(&w, static_cast<uint32_t>(extension), 4);
+    put(&w, kAacLowComplexity, 5);
+    put_general(&w, *config);
+    config->size = static_cast<int32_t>((w.at + 7) / 8);
+}
 
 struct block_output {
     int32_t samples;  // sample frames of a block; 0: it does not decode
@@ -64,11 +140,64 @@ block_output find_output(io_file *file, const aac_config *config, const frame_in
 
 }  // namespace
 
+int32_t aac_rate_of_index(int32_t index) {
+    return index >= 0 && index < kRateCount ? kRates[index] : 0;
+}
+
+void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index,
+                     int32_t channels) {
+    *config = {{}, kPlainBytes, object_type, rate_index, channels, false};
+    bit_writer w = {config->bytes, 0};
+    put_core(&w, *config);
+    put_general(&w, *config);
+}
+
+bool aac_config_add_program(aac_config *config, const uint8_t *data, int32_t bytes) {
+    bit_reader r = {data, int64_t{bytes} * 8, kIdentifierBits};
+    bit_writer w = {config->bytes, kPlainBytes * 8};
+    copy(&r, &w, 10);  // instance tag, object type, rate index
+    const uint32_t front = copy(&r, &w, 4);
+    const uint32_t side = copy(&r, &w, 4);
+    const uint32_t back = copy(&r, &w, 4);
+    const uint32_t low = copy(&r, &w, 2);
+    const uint32_t data_elements = copy(&r, &w, 3);
+    const uint32_t coupling = copy(&r, &w, 4);
+    for (const int32_t bits : kMixdownBits) {
+        if (copy(&r, &w, 1) != 0) copy(&r, &w, bits);
+    }
+    for (uint32_t i = 0; i < front + side + back; ++i) copy(&r, &w, 5);
+    for (uint32_t i = 0; i < low + data_elements; ++i) copy(&r, &w, 4);
+    for (uint32_t i = 0; i < coupling; ++i) copy(&r, &w, 5);
+    r.at = (r.at + 7) / 8 * 8;
+    r.at += static_cast<int64_t>(get(&r, 8)) * 8;  // a comment, left out of the copy
+    w.at = (w.at + 7) / 8 * 8;
+    put(&w, 0, 8);
+    config->size = static_cast<int32_t>(w.at / 8);
+    return r.at <= r.bits;
+}
+
+bool aac_config_read(aac_config *config, const void *data, int32_t bytes) {
+    *config = {};
+    if (data == nullptr || bytes < 2 || bytes > kAacMaxConfig) return false;
+    memcpy(config->bytes, data, static_cast<size_t>(bytes));
+    config->size = bytes;
+    bit_reader r = {config->bytes, int64_t{bytes} * 8, 0};
+    config->object_type = static_cast<int32_t>(get(&r, 5));
+    if (config->object_type == kObjectEscape) {
+        config->object_type = 32 + static_cast<int32_t>(get(&r, 6));
+    }
+    config->rate_index = static_cast<int32_t>(get(&r, 4));
+    if (config->rate_index == kRateEscape) get(&r, 24);
+    config->channels = static_cast<int32_t>(get(&r, 4));
+    config->short_frames = config->object_type == kAacLowComplexity && get(&r, 1) != 0;
+    return r.at <= r.bits;
+}
+
 bool aac_stream_complete(io_file *file, aac_config *config, stream_info *info) {
     const block_output output = find_output(file, config, &info->frames);
     if (output.rate <= 0) return false;
     const bool sbr = output.rate == 2 * aac_rate_of_index(config->rate_index);
-    if (sbr) aac_config_make_sbr(config, config->channels == 1 && output.channels == 2);
+    if (sbr) state_sbr(config, config->channels == 1 && output.channels == 2);
     int64_t first = 0;
     for (int64_t i = 0; i < info->frames.count; ++i) {
         frame_entry &entry = info->frames.entry[i];

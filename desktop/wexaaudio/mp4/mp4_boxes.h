@@ -7,7 +7,7 @@
 #ifndef WEXAAUDIO_MP4_BOXES_H
 #define WEXAAUDIO_MP4_BOXES_H
 
-#include "desktop/wexaaudio/aac/aac_config.h"
+#include "desktop/wexaaudio/aac/aac_stream.h"
 #include "desktop/wexaaudio/shared/stream.h"
 
 struct mp4_codec {

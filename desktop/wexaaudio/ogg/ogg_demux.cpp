@@ -2,11 +2,18 @@
 // one stream, and the stream handle is the demuxer itself.
 //
 // In: mtsrc_io. Out: PCM, the set-up data, the information records.
+//
+// A stream's pages are scattered and its packets continue across them, so packets are identified by
+// their logical offset: the bytes of the stream's page bodies before them.
+#include <ogg/ogg.h>
+
+#include <algorithm>
+#include <climits>
 #include <cstdlib>
 #include <cstring>
 #include <string_view>
 
-#include "desktop/wexaaudio/ogg/ogg_scan.h"
+#include "desktop/wexaaudio/shared/stream.h"
 #include "media_source/wexaaudio.h"
 
 namespace {
@@ -17,30 +24,208 @@ constexpr int32_t kVorbis = 323;  // codec code
 // How the first packets of the audio codecs begin; Vorbis first.
 constexpr std::string_view kAudio[] = {"\x01vorbis", "OpusHead", "\177FLAC", "fLaC", "Speex   "};
 
-struct page_reader {
-    ogg_sync_state sync;
+constexpr int32_t kVorbisHeaders = 3;           // packets: identification, comments, set-up
+constexpr int32_t kNameBytes = 7;               // packet type and "vorbis"
+constexpr int32_t kIdBytes = 30;                // of the identification packet
+constexpr int32_t kChannelsAt = 11;             // in it
+constexpr int32_t kRateAt = 12;                 // likewise; 32-bit, little endian
+constexpr int32_t kMaxCodebooks = 1 << 20;      // bytes; usual ones have 3 to 10 thousand
+constexpr int64_t kMaxGranule = INT64_MAX / 2;  // larger ones count as this: sums stay exact
+constexpr int32_t kMaxPacket32 = 1 << 26;       // bytes; comments may hold pictures
+
+// Replace the file's own comments, which no decoder needs and which may hold a picture.
+constexpr uint8_t kNoComments[] = {3, 'v', 'o', 'r', 'b', 'i', 's', 0, 0, 0, 0, 0, 0, 0, 0, 1};
+constexpr int32_t kPackHead = 3;  // the mark and the lengths of the first two packets, below 255
+
+struct ogg_scan {
     io_file *file;
-    int64_t read;  // offset of the next byte to be read
-    int64_t at;    // offset of the next byte to be parsed
+    const codec_library *library;
+    stream_info *info;
+    ogg_sync_state sync;    // finds pages
+    int64_t read_at;        // offset in the file of the next byte to be read
+    int64_t parse_at;       // and of the next one to be parsed
+    vorbis_parser *parser;  // owned; once the headers are complete
+    int64_t header_at[kVorbisHeaders];
+    int32_t header_bytes[kVorbisHeaders];
+    int32_t headers;       // found so far
+    long next_page;        // number of the page after the last
+    bool gap;              // pages are missing since the last granule position
+    bool open;             // a packet has begun
+    int64_t packet_at;     // logical offset of it
+    int32_t packet_bytes;  // of it so far
+    uint8_t packet_first;  // its first byte
+    bool has_base;
+    int64_t base;      // granule position at sample 0; known once has_base
+    int64_t page_end;  // end of the audio at the second-last page with a granule position
+    int64_t last_end;  // end by the last granule position, sample frames
 };
+
+// Copies the first bytes of a header packet, its name at least. False when it is not Vorbis's.
+bool read_header(const ogg_scan *scan, int32_t number, uint8_t *packet, int32_t bytes) {
+    return stream_copy(scan->file, scan->info, scan->header_at[number], packet, bytes) == bytes &&
+           packet[0] == 2 * number + 1 && memcmp(packet + 1, "vorbis", kNameBytes - 1) == 0;
+}
+
+// Packs the identification and set-up packets into p. False when they are not Vorbis headers.
+bool pack(const ogg_scan *scan, uint8_t *p) {
+    p[0] = kVorbisSetupMark;
+    p[1] = kIdBytes;
+    p[2] = sizeof kNoComments;
+    uint8_t *id = p + kPackHead;
+    uint8_t *comments = id + kIdBytes;
+    memcpy(comments, kNoComments, sizeof kNoComments);
+    if (!read_header(scan, 0, id, kIdBytes) ||
+        !read_header(scan, 2, comments + sizeof kNoComments, scan->header_bytes[2])) {
+        return false;
+    }
+    uint32_t rate = 0;
+    for (int32_t i = 3; i >= 0; --i) rate = rate << 8 | id[kRateAt + i];
+    scan->info->channels = id[kChannelsAt];
+    scan->info->rate = rate <= INT32_MAX ? static_cast<int32_t>(rate) : 0;
+    return scan->info->rate > 0 && scan->info->channels > 0;
+}
+
+// Prepares the stream once its three header packets are complete.
+bool read_headers(ogg_scan *scan) {
+    const int32_t books = scan->header_bytes[2];
+    uint8_t name[kNameBytes];
+    if (scan->header_bytes[0] != kIdBytes || books > kMaxCodebooks ||
+        !read_header(scan, 1, name, kNameBytes)) {
+        return false;
+    }
+    stream_info *info = scan->info;
+    info->setup_bytes = kPackHead + kIdBytes + static_cast<int32_t>(sizeof kNoComments) + books;
+    info->setup = static_cast<uint8_t *>(malloc(static_cast<size_t>(info->setup_bytes)));
+    if (info->setup == nullptr || !pack(scan, info->setup)) return false;
+    scan->parser = scan->library->parser_open(info->setup, info->setup_bytes);
+    return scan->parser != nullptr;
+}
+
+// Adds a packet that is complete.
+bool add_packet(ogg_scan *scan) {
+    if (scan->headers < kVorbisHeaders) {
+        if (scan->packet_bytes < kNameBytes) return false;
+        scan->header_at[scan->headers] = scan->packet_at;
+        scan->header_bytes[scan->headers] = scan->packet_bytes;
+        ++scan->headers;
+        return scan->headers < kVorbisHeaders || read_headers(scan);
+    }
+    if (scan->packet_bytes == 0) return true;
+    const int32_t samples = scan->library->parser_samples(scan->parser, scan->packet_first);
+    if (samples <= 0) return true;  // not an audio packet: not decoded
+    // The first packet only primes the decoder for the next.
+    frame_index *packets = &scan->info->frames;
+    return frame_index_add(packets, scan->packet_at, scan->packet_bytes,
+                           packets->count > 0 ? samples : 0);
+}
+
+// The first granule position states where the stream starts. More audio than it counts is cut off
+// at the start, unless the stream also ends here, when it is cut at the end.
+void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
+    frame_index *packets = &scan->info->frames;
+    const int64_t surplus = frame_index_end(packets) - granule;
+    scan->has_base = true;
+    scan->base = std::max<int64_t>(-surplus, 0);
+    if (surplus <= 0 || ends) return;
+    int64_t cut = surplus;
+    for (int64_t i = 0; i < packets->count; ++i) {
+        frame_entry &entry = packets->entry[i];
+        const auto part = static_cast<int32_t>(std::min<int64_t>(cut, entry.samples));
+        entry.first = std::max<int64_t>(entry.first - surplus, 0);
+        entry.samples -= part;
+        cut -= part;
+        if (part > 0 && entry.samples > 0) {
+            scan->info->cut_frame = i;
+            scan->info->cut_samples = part;
+        }
+    }
+}
+
+// Reads the page's lacing values.
+bool read_segments(ogg_scan *scan, const ogg_page *page, int64_t body_first) {
+    const int32_t segments = page->header[26];
+    const uint8_t *lacing = page->header + 27;
+    int64_t at = 0;
+    bool skipping = !scan->open && ogg_page_continued(page) != 0;
+    for (int32_t i = 0; i < segments; ++i) {
+        if (!scan->open && !skipping) {
+            scan->open = true;
+            scan->packet_at = body_first + at;
+            scan->packet_bytes = 0;
+            scan->packet_first = lacing[i] > 0 ? page->body[at] : 0;
+        }
+        at += lacing[i];
+        if (scan->open) scan->packet_bytes += lacing[i];
+        if (scan->packet_bytes > kMaxPacket32) return false;
+        if (lacing[i] == 255) continue;
+        const bool whole = scan->open;
+        scan->open = false;
+        skipping = false;
+        if (whole && !add_packet(scan)) return false;
+    }
+    return true;
+}
+
+// Adds the next page of the stream; body_at is its body's offset in the file. False when out of
+// memory or when the stream is not Vorbis.
+bool add_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
+    frame_index *pages = &scan->info->pages;
+    const frame_index *packets = &scan->info->frames;
+    const int64_t body_first = frame_index_end(pages);
+    const auto body_bytes = static_cast<int32_t>(page->body_len);
+    if (body_bytes > 0 && !frame_index_add(pages, body_at, body_bytes, body_bytes)) return false;
+    // A packet continues only in the next page, and only if that page states it; else it is lost.
+    const long number = ogg_page_pageno(page);
+    const bool missing = number != scan->next_page;
+    if (missing || ogg_page_continued(page) == 0) scan->open = false;
+    scan->gap = scan->gap || missing;
+    scan->next_page = number + 1;
+    const int64_t granule = std::min<int64_t>(ogg_page_granulepos(page), kMaxGranule);
+    if (granule >= 0) scan->page_end = frame_index_end(packets);
+    if (!read_segments(scan, page, body_first)) return false;
+    if (granule < 0 || packets->count == 0) return true;
+    if (!scan->has_base) {
+        apply_first_granule(scan, granule, ogg_page_eos(page) != 0);
+    } else if (scan->gap) {
+        scan->base = granule - frame_index_end(packets);  // lost time is not filled
+    }
+    scan->gap = false;
+    scan->last_end = granule - scan->base;
+    return true;
+}
+
+// Cuts the last packets to the final granule position. False when the stream has no audio.
+bool cut_end(ogg_scan *scan) {
+    frame_index *packets = &scan->info->frames;
+    if (!scan->has_base) return packets->count > 0;
+    // Never before the end of the page before the last: a smaller position is damage.
+    const int64_t end = std::max(scan->last_end, scan->page_end);
+    for (int64_t i = packets->count - 1; i >= 0 && frame_index_end(packets) > end; --i) {
+        frame_entry &entry = packets->entry[i];
+        entry.samples =
+            static_cast<int32_t>(std::clamp<int64_t>(end - entry.first, 0, entry.samples));
+        packets->count = entry.samples == 0 ? i : packets->count;
+    }
+    return packets->count > 0;
+}
 
 // Reads the next whole page with a correct check sum; *offset receives where it starts. False at
 // the end and on failure.
-bool next_page(page_reader *r, ogg_page *page, int64_t *offset) {
+bool next_page(ogg_scan *scan, ogg_page *page, int64_t *offset) {
+    io_file *file = scan->file;
     for (;;) {
-        const long step = ogg_sync_pageseek(&r->sync, page);
-        *offset = r->at;
-        r->at += std::abs(step);
+        const long step = ogg_sync_pageseek(&scan->sync, page);
+        *offset = scan->parse_at;
+        scan->parse_at += std::abs(step);
         if (step > 0) return true;
         if (step < 0) continue;
-        char *buf = ogg_sync_buffer(&r->sync, kReadBytes);
-        const int64_t got = buf != nullptr ? io_file_read(r->file, r->read, buf, kReadBytes) : -1;
-        if (got <= 0) {
-            r->file->failed = r->file->failed || got < 0;
-            return false;
-        }
-        r->read += got;
-        ogg_sync_wrote(&r->sync, static_cast<long>(got));
+        char *buf = ogg_sync_buffer(&scan->sync, kReadBytes);
+        const int64_t got =
+            buf != nullptr ? io_file_read(file, scan->read_at, buf, kReadBytes) : -1;
+        file->failed = file->failed || got < 0;
+        if (got <= 0) return false;
+        scan->read_at += got;
+        ogg_sync_wrote(&scan->sync, static_cast<long>(got));
     }
 }
 
@@ -61,13 +246,13 @@ void add_stream(stream_info *info, const ogg_page *page) {
 
 // Reads the pages of the first group of streams; a second one may be chained to it. False when the
 // audio stream is not Vorbis after all.
-bool read_pages(page_reader *r, ogg_scan *scan) {
+bool read_pages(ogg_scan *scan) {
     stream_info *info = scan->info;
     ogg_page page;
     int64_t offset = 0;
     int serial = 0;
     bool in_heads = true;
-    while (next_page(r, &page, &offset)) {
+    while (next_page(scan, &page, &offset)) {
         const bool head = ogg_page_bos(&page) != 0;
         if (head && !in_heads) return true;
         in_heads = head;
@@ -76,7 +261,7 @@ bool read_pages(page_reader *r, ogg_scan *scan) {
         if (!was_known) serial = ogg_page_serialno(&page);
         if (!in_heads && info->codec == nullptr) return true;  // nothing more to find
         if (info->codec != nullptr && serial == ogg_page_serialno(&page) &&
-            !ogg_scan_page(scan, &page, offset + page.header_len)) {
+            !add_page(scan, &page, offset + page.header_len)) {
             return false;
         }
     }
@@ -84,19 +269,18 @@ bool read_pages(page_reader *r, ogg_scan *scan) {
 }
 
 bool scan_file(io_file *file, stream_info *info) {
-    page_reader r = {{}, file, 0, 0};
-    ogg_sync_init(&r.sync);
     ogg_scan scan = {};
+    ogg_sync_init(&scan.sync);
     scan.file = file;
     scan.library = codec_library_get();
     scan.info = info;
     info->track = -1;
     info->out_channels = 1;
     info->preroll = 1;  // what a packet overlaps with
-    const bool is_vorbis = read_pages(&r, &scan) && info->codec != nullptr && ogg_scan_end(&scan);
+    const bool is_vorbis = read_pages(&scan) && info->codec != nullptr && cut_end(&scan);
     if (!is_vorbis) info->codec = nullptr;
     scan.library->parser_close(scan.parser);
-    ogg_sync_clear(&r.sync);
+    ogg_sync_clear(&scan.sync);
     return !file->failed && info->track_count > 0;
 }
 
