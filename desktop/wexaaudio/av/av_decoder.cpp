@@ -109,9 +109,8 @@ int32_t decode(av_decoder *d) {
 }
 
 void get_format(const av_decoder *d, int32_t *rate, int32_t *channels) {
-    const bool held = d->frame->nb_samples > 0;
-    *rate = held ? d->frame->sample_rate : 0;
-    *channels = held ? d->frame->ch_layout.nb_channels : 0;
+    *rate = d->frame->sample_rate;
+    *channels = d->frame->ch_layout.nb_channels;
 }
 
 int32_t write_pcm(const av_decoder *d, int32_t channels, int32_t skip, int32_t count,

@@ -29,12 +29,10 @@ struct flac_stream {
     FLAC__StreamDecoder *decoder;  // owned
     int64_t at;                    // offset that the decoder reads next
     int32_t max_block;             // sample frames
-    int64_t stated;                // sample frames by the stream information, 0 unknown
     int64_t base;                  // number of the stream's first sample
     int16_t *pcm;                  // [max_block][2] owned; the block decoded last
     int64_t block;                 // its first sample
     int32_t count;                 // its sample frames; 0 without one
-    int32_t rate;                  // its rate, Hz
     bool damaged;                  // the frame being decoded has a wrong check sum
 };
 
@@ -62,21 +60,6 @@ FLAC__StreamDecoderReadStatus read_bytes(const FLAC__StreamDecoder * /*decoder*/
     s->at += got;
     return got == 0 ? FLAC__STREAM_DECODER_READ_STATUS_END_OF_STREAM
                     : FLAC__STREAM_DECODER_READ_STATUS_CONTINUE;
-}
-
-void read_info(const FLAC__StreamDecoder * /*decoder*/, const FLAC__StreamMetadata *metadata,
-               void *client) {
-    flac_stream *s = stream_of(client);
-    const FLAC__StreamMetadata_StreamInfo &info = metadata->data.stream_info;
-    s->max_block = static_cast<int32_t>(info.max_blocksize);
-    s->stated = static_cast<int64_t>(info.total_samples);
-}
-
-void note_error(const FLAC__StreamDecoder * /*decoder*/, FLAC__StreamDecoderErrorStatus status,
-                void *client) {
-    if (status == FLAC__STREAM_DECODER_ERROR_STATUS_FRAME_CRC_MISMATCH) {
-        stream_of(client)->damaged = true;
-    }
 }
 
 // Stores a block as pairs of 16 bits.
@@ -108,7 +91,6 @@ FLAC__StreamDecoderWriteStatus store_block(const FLAC__StreamDecoder * /*decoder
     s->count = usable ? count : 0;
     if (!usable) return FLAC__STREAM_DECODER_WRITE_STATUS_CONTINUE;
     s->block = static_cast<int64_t>(head.number.sample_number) - s->base;
-    s->rate = static_cast<int32_t>(head.sample_rate);
     store_pairs(buffer[0], buffer[head.channels > 1 ? 1 : 0],
                 static_cast<int32_t>(head.bits_per_sample), count, s->pcm);
     return FLAC__STREAM_DECODER_WRITE_STATUS_CONTINUE;
@@ -129,6 +111,14 @@ bool open_stream(flac_stream *s, io_file *file) {
     };
     const auto at_end = [](const auto *, void *client) -> FLAC__bool {
         return stream_of(client)->at >= stream_of(client)->file->size ? 1 : 0;
+    };
+    const auto read_info = [](const auto *, const FLAC__StreamMetadata *metadata, void *client) {
+        const uint32_t largest = metadata->data.stream_info.max_blocksize;
+        stream_of(client)->max_block = static_cast<int32_t>(largest);
+    };
+    const auto note_error = [](const auto *, FLAC__StreamDecoderErrorStatus status, void *client) {
+        flac_stream *stream = stream_of(client);
+        if (status == FLAC__STREAM_DECODER_ERROR_STATUS_FRAME_CRC_MISMATCH) stream->damaged = true;
     };
     s->file = file;
     s->decoder = FLAC__stream_decoder_new();
@@ -157,13 +147,6 @@ bool decode_block(flac_stream *s) {
         if (s->count == 0 && state >= FLAC__STREAM_DECODER_END_OF_STREAM) return false;
     }
     return true;
-}
-
-// Returns to the first frame.
-bool rewind_stream(flac_stream *s) {
-    s->count = 0;
-    return FLAC__stream_decoder_reset(s->decoder) != 0 &&
-           FLAC__stream_decoder_process_until_end_of_metadata(s->decoder) != 0;
 }
 
 // Decodes the block that holds a sample and makes it start there. False when there is none.
@@ -197,17 +180,18 @@ bool find_end(flac_stream *s, int64_t *end) {
         *end = last_end(s, std::max<int64_t>(size - tail, 0));
         if (tail >= size) break;
     }
-    if (s->stated > 0) *end = std::min(*end, s->stated);
+    const auto stated = static_cast<int64_t>(FLAC__stream_decoder_get_total_samples(s->decoder));
+    if (stated > 0) *end = std::min(*end, stated);  // else it is unknown
     return !s->file->failed && *end > 0 && *end / kMaxSamplesPerByte <= size;
 }
 
 bool scan_file(io_file *file, stream_info *info) {
     flac_stream s = {};
-    bool found = open_stream(&s, file) && decode_block(&s) && s.rate > 0;
+    bool found = open_stream(&s, file) && decode_block(&s);
     if (found) {
-        info->rate = s.rate;
+        info->rate = static_cast<int32_t>(FLAC__stream_decoder_get_sample_rate(s.decoder));
         info->base = s.base = s.block;
-        found = find_end(&s, &info->end);
+        found = info->rate > 0 && find_end(&s, &info->end);
     }
     close_stream(&s);
     return found;
@@ -239,7 +223,9 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     if (r->moved && !find_sample(s, r->next)) {
         // Where seeking fails, the stream is read from the start up to the position.
         r->file.failed = false;
-        if (!rewind_stream(s)) return -1;
+        s->count = 0;
+        if (FLAC__stream_decoder_reset(s->decoder) == 0) return -1;
+        if (FLAC__stream_decoder_process_until_end_of_metadata(s->decoder) == 0) return -1;
     }
     r->moved = false;
     bool more = true;

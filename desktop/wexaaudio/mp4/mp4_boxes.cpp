@@ -317,16 +317,6 @@ bool read_track_runs(parser *p, int64_t moof, span traf, int64_t *offset) {
     return true;
 }
 
-bool read_fragment(parser *p, const box &moof) {
-    span level = moof.body;
-    int64_t offset = moof.start;
-    box traf = {};
-    while (next_named(p->file, &level, name_of("traf"), &traf)) {
-        if (!read_track_runs(p, moof.start, traf.body, &offset)) return false;
-    }
-    return true;
-}
-
 // Reads the kinds of the tracks and the tables of the first audio track.
 bool read_movie(parser *p, span moov) {
     io_file *file = p->file;
@@ -369,7 +359,11 @@ bool mp4_read_boxes(io_file *file, stream_info *info, mp4_codec *codec) {
     box moof = {};
     span level = all;
     while (!p.ended && next_named(file, &level, name_of("moof"), &moof)) {
-        if (!read_fragment(&p, moof)) return false;
+        int64_t offset = moof.start;
+        box traf = {};
+        while (next_named(file, &moof.body, name_of("traf"), &traf)) {
+            if (!read_track_runs(&p, moof.start, traf.body, &offset)) return false;
+        }
     }
     return !file->failed;
 }

@@ -29,6 +29,13 @@ int32_t frame_bytes(const mpeg_header &h, int32_t kbits, int32_t padding) {
     return factor * bits / h.rate + padding;
 }
 
+// Bytes from a Layer III frame's start to its main data.
+int32_t main_data_at(const mpeg_header *h) {
+    const int32_t side =
+        h->version == 1 ? (h->channels == 1 ? 17 : 32) : (h->channels == 1 ? 9 : 17);
+    return kMpegHeaderBytes + (h->has_crc ? 2 : 0) + side;
+}
+
 }  // namespace
 
 bool mpeg_parse(const uint8_t *p, mpeg_header *h) {
@@ -56,16 +63,10 @@ bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b) {
     return a->version == b->version && a->layer == b->layer && a->rate == b->rate;
 }
 
-int32_t mpeg_main_data_at(const mpeg_header *h) {
-    const int32_t side =
-        h->version == 1 ? (h->channels == 1 ? 17 : 32) : (h->channels == 1 ? 9 : 17);
-    return kMpegHeaderBytes + (h->has_crc ? 2 : 0) + side;
-}
-
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes) {
     if (h->layer != 3) return false;
     // Some encoders ignore the check sum when they place the table.
-    const int32_t at = mpeg_main_data_at(h);
+    const int32_t at = main_data_at(h);
     for (const int32_t place : {at, h->has_crc ? at - 2 : at}) {
         if (place + 4 <= bytes &&
             (memcmp(p + place, "Xing", 4) == 0 || memcmp(p + place, "Info", 4) == 0)) {
@@ -84,5 +85,5 @@ void mpeg_describe(const mpeg_header *head, stream_info *info) {
     // margin, since it costs next to nothing.
     info->preroll = 3;
     info->reservoir = head->layer == 3 ? kMpegMaxBackstep : 0;
-    info->overhead = mpeg_main_data_at(head);
+    info->overhead = main_data_at(head);
 }

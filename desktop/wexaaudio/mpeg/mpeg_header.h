@@ -27,9 +27,6 @@ bool mpeg_parse(const uint8_t *p, mpeg_header *h);
 // Same version, layer and rate: frames of one stream.
 bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
 
-// Bytes from a Layer III frame's start to its main data.
-int32_t mpeg_main_data_at(const mpeg_header *h);
-
 // True if a stream's first frame holds an encoder's table (Xing, Info, VBRI) instead of music. p
 // holds the frame, bytes of it.
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);

@@ -128,8 +128,6 @@ bool scan_file(io_file *file, stream_info *info) {
     mpeg_scan s = {file, find_end(file), 0, {}, false};
     if (!find_start(&s) || !walk(&s, &info->frames)) return false;
     mpeg_describe(&s.head, info);
-    // Positions of seeks and the duration count what the source delivers, which drops the start of
-    // the first frame. The times of the frames count what is decoded: the whole first frame has 0.
     if (s.head.rate == kDropRate && s.head.channels == 2) {
         info->delay = std::min(kWexaMpegDelay, s.head.samples);
     }

@@ -7,8 +7,7 @@
 
 bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples) {
     constexpr int64_t kFirstCapacity = 1024;  // entries
-    constexpr int64_t kMaxFrames =
-        1 << 22;  // more than a day of audio; guards against damaged counts
+    constexpr int64_t kMaxFrames = 1 << 22;   // more than a day of audio has
     const int64_t first = frame_index_end(index);
     if (first > kMaxSamples || index->count == kMaxFrames) return false;
     if (index->count == index->capacity) {
@@ -34,9 +33,4 @@ int64_t frame_index_end(const frame_index *index) {
     if (index->count == 0) return 0;
     const frame_entry &last = index->entry[index->count - 1];
     return last.first + last.samples;
-}
-
-void frame_index_free(frame_index *index) {
-    free(index->entry);
-    *index = {};
 }

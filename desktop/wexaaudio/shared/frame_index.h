@@ -29,6 +29,4 @@ int64_t frame_index_find(const frame_index *index, int64_t sample);
 // End of the last frame, sample frames; 0 when empty.
 int64_t frame_index_end(const frame_index *index);
 
-void frame_index_free(frame_index *index);
-
 #endif

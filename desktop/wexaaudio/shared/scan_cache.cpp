@@ -48,29 +48,10 @@ cached_scan *find(const cached_scan &wanted) {
 }
 
 void release(cached_scan *c) {
-    frame_index_free(&c->frames);
-    frame_index_free(&c->pages);
+    free(c->frames.entry);
+    free(c->pages.entry);
     free(c->setup);
     free(c);
-}
-
-// Removes a user of c, then the scans without users from the list, except a kept one. Returns them
-// as a list of their own.
-cached_scan *remove_user(cached_scan *c, const cached_scan *kept) {
-    const std::lock_guard<std::mutex> guard(lock);
-    --c->users;
-    cached_scan *unused = nullptr;
-    for (cached_scan **link = &scans; *link != nullptr;) {
-        cached_scan *each = *link;
-        if (each->users > 0 || each == kept) {
-            link = &each->next;
-            continue;
-        }
-        *link = each->next;
-        each->next = unused;
-        unused = each;
-    }
-    return unused;
 }
 
 }  // namespace
@@ -100,10 +81,15 @@ void scan_cache_put(const stream_info *info) {
     auto *c = static_cast<cached_scan *>(const_cast<stream_info *>(info));
     if (!c->shared) return release(c);
     const bool settled = time(nullptr) > c->file.st_ctim.tv_sec + kSettled;
-    cached_scan *unused = remove_user(c, settled ? c : nullptr);
-    while (unused != nullptr) {
-        cached_scan *next = unused->next;
-        release(unused);
-        unused = next;
+    const std::lock_guard<std::mutex> guard(lock);
+    --c->users;
+    for (cached_scan **link = &scans; *link != nullptr;) {
+        cached_scan *each = *link;
+        if (each->users > 0 || (each == c && settled)) {
+            link = &each->next;
+        } else {
+            *link = each->next;
+            release(each);
+        }
     }
 }

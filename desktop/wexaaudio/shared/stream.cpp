@@ -39,12 +39,11 @@ int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
 int32_t decode_next(stream_reader *r) {
     const stream_info *info = r->info;
     int64_t n = r->next;
-    if (r->fresh || (info->group > 0 && n % info->group == 0)) {
+    if (r->decoder == nullptr || (info->group > 0 && n % info->group == 0)) {
         r->library->close(r->decoder);
         r->decoder = r->library->open(info->codec, info->setup, info->setup_bytes);
         if (r->decoder == nullptr) return kCodecNoMemory;
         n = first_needed(info, n);
-        r->fresh = false;
     }
     int32_t held = 0;
     for (; n <= r->next && held >= 0; ++n) held = decode_frame(r, info->frames.entry[n]);
@@ -117,7 +116,8 @@ int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached) {
     const frame_index *frames = &info->frames;
     r->next = sample < end ? frame_index_find(frames, decoded) : frames->count;
     r->skip = sample < end ? static_cast<int32_t>(decoded - frames->entry[r->next].first) : 0;
-    r->fresh = true;
+    r->library->close(r->decoder);
+    r->decoder = nullptr;
     *reached = units_from_samples(sample, info->rate);
     return 0;
 }
@@ -148,7 +148,6 @@ decltype(stream_of_track) xoggds_open [[gnu::alias("stream_of_track")]];
 stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration) {
     auto *r = static_cast<stream_reader *>(calloc(1, sizeof(stream_reader)));
     if (r == nullptr) return nullptr;
-    r->fresh = true;
     r->library = codec_library_get();
     if (r->library != nullptr && io_file_open(&r->file, io)) {
         r->info = scan_cache_get(&r->file, scan);

@@ -3,9 +3,6 @@
 // seek and delete them are the same.
 //
 // In: the frames that a format's scan finds. Out: PCM, frame by frame, for the copying decoders.
-//
-// The output depends on the position in the file alone: after a seek a fresh decoder first decodes
-// as many earlier frames as it needs to reach the state of a linear read.
 #ifndef WEXAAUDIO_STREAM_H
 #define WEXAAUDIO_STREAM_H
 
@@ -16,10 +13,9 @@ struct stream_reader {
     io_file file;
     const codec_library *library;
     const stream_info *info;  // shared by the readers of the file
-    av_decoder *decoder;      // owned; null until the first read
+    av_decoder *decoder;      // owned; null until the first read after opening or a seek
     int64_t next;             // frame read next
     int32_t skip;             // sample frames cut from its front
-    bool fresh;               // it needs a fresh decoder
 };
 
 // Null when the file cannot be read as the format, when libavcodec is missing, and when out of

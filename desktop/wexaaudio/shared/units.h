@@ -12,13 +12,11 @@ constexpr int64_t kMaxSamples = INT64_MAX / kUnits / 4;  // far beyond any file;
 int64_t units_from_samples(int64_t sample, int32_t rate);
 
 // The sample reached by a seek to a time in a stream of end samples: the first that begins at or
-// after it, so that the last of several equal parts of a stream never loses its end. The end itself
-// when the time is after the last sample's start.
+// after it. The end itself when the time is after the last sample's start.
 int64_t seek_target(int64_t units, int64_t end, int32_t rate);
 
 // A stream's duration: past its last sample by less than half a microsecond, rounded up to a
-// multiple of four units. A stream is decoded in four parts of a quarter of that each, and a
-// quarter rounded down must still hold a quarter of the samples.
+// multiple of four units, so that a quarter of it still holds a quarter of the samples.
 int64_t units_of_duration(int64_t samples, int32_t rate);
 
 #endif
