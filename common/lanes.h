@@ -12,6 +12,7 @@ typedef int32_t int_pair __attribute__((vector_size(8)));
 typedef float float_quad __attribute__((vector_size(16)));
 typedef int32_t int_quad __attribute__((vector_size(16)));
 typedef int64_t int64_pair __attribute__((vector_size(16)));
+typedef int16_t int16_quad __attribute__((vector_size(8)));
 typedef int16_t int16_octet __attribute__((vector_size(16)));
 
 // Loads (stores) two neighbouring doubles, which need only the alignment of a double.

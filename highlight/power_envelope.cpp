@@ -23,14 +23,30 @@ void add_hop(double_pair sums[kOverlap], const int16_t *first, const int16_t *se
     double_pair oldest = sums[0];
     double_pair middle = sums[1];
     double_pair newest = sums[2];
-    for (int64_t i = 0; i < hop; ++i) {
-        const double_pair x = {static_cast<double>(first[i]), static_cast<double>(second[i])};
+    const auto add = [&](int_pair samples) {
+        const auto x = __builtin_convertvector(samples, double_pair);
         const double_pair level = x * kInverseHead + x * kInverseTail;
         const double_pair square = level * level;
         oldest += square;
         middle += square;
         newest += square;
+    };
+    int64_t i = 0;
+    for (; i + 4 <= hop; i += 4) {
+        int16_quad a;
+        int16_quad b;
+        memcpy(&a, first + i, sizeof a);
+        memcpy(&b, second + i, sizeof b);
+        const auto low =
+            __builtin_convertvector(__builtin_shufflevector(a, b, 0, 4, 1, 5), int_quad);
+        const auto high =
+            __builtin_convertvector(__builtin_shufflevector(a, b, 2, 6, 3, 7), int_quad);
+        add(__builtin_shufflevector(low, low, 0, 1));
+        add(__builtin_shufflevector(low, low, 2, 3));
+        add(__builtin_shufflevector(high, high, 0, 1));
+        add(__builtin_shufflevector(high, high, 2, 3));
     }
+    for (; i < hop; ++i) add(int_pair{first[i], second[i]});
     sums[0] = oldest;
     sums[1] = middle;
     sums[2] = newest;
