@@ -44,11 +44,11 @@ struct mel_term {
 
 // Scratch of one worker. Lane 0 is analysis frame k, lane 1 the next one.
 struct worker_scratch {
-    double *samples;    // [N + H] scaled samples of both frames
-    double_pair *re;    // [N], then the powers in [N / 2]
-    double_pair *im;    // [N]
-    mel_term *terms;    // terms of all bands, ordered by band, then bin
-    int64_t *band_end;  // [bands] index past the band's last term
+    double *samples;         // [N + H] scaled samples of both frames
+    double_pair *transform;  // [2 N]
+    double_pair *powers;     // [N / 2] of both frames
+    mel_term *terms;         // terms of all bands, ordered by band, then bin
+    int64_t *band_end;       // [bands] index past the band's last term
 };
 
 double *create_hann_window(int32_t size) {
@@ -69,12 +69,12 @@ bool allocate_scratch(const TAVO_ONSET_WORKER *worker, worker_scratch *scratch) 
     const int64_t size = worker->frame_size;
     const int64_t bands = worker->band_count;
     scratch->samples = zeroed_items<double>(size + worker->hop_size);
-    scratch->re = zeroed_items<double_pair>(2 * size);
-    scratch->im = scratch->re + size;
+    scratch->transform = zeroed_items<double_pair>(2 * size);
+    scratch->powers = zeroed_items<double_pair>(size / 2);
     scratch->terms = zeroed_items<mel_term>(size / 2 * bands);
     scratch->band_end = zeroed_items<int64_t>(bands);
-    if (scratch->samples == nullptr || scratch->re == nullptr || scratch->terms == nullptr ||
-        scratch->band_end == nullptr) {
+    if (scratch->samples == nullptr || scratch->transform == nullptr ||
+        scratch->powers == nullptr || scratch->terms == nullptr || scratch->band_end == nullptr) {
         return false;
     }
     int64_t count = 0;
@@ -82,7 +82,7 @@ bool allocate_scratch(const TAVO_ONSET_WORKER *worker, worker_scratch *scratch) 
         for (int64_t bin = 0; bin < size / 2; ++bin) {
             const auto weight = static_cast<double>(worker->mel_matrix[bin][band]);
             if (weight == 0.0) continue;
-            scratch->terms[count++] = {double_pair{weight, weight}, scratch->re + bin};
+            scratch->terms[count++] = {double_pair{weight, weight}, scratch->powers + bin};
         }
         scratch->band_end[band] = count;
     }
@@ -91,7 +91,8 @@ bool allocate_scratch(const TAVO_ONSET_WORKER *worker, worker_scratch *scratch) 
 
 void release_scratch(worker_scratch *scratch) {
     free(scratch->samples);
-    free(scratch->re);
+    free(scratch->transform);
+    free(scratch->powers);
     free(scratch->terms);
     free(scratch->band_end);
 }
@@ -108,34 +109,17 @@ void scale_frames(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next, double *sa
     scale_samples(view, size + (next - k) * hop - kept, samples + kept);
 }
 
-// Replaces re by the powers of the bins, rounded to single precision. Returns true if all of them
-// are finite.
-bool compute_powers(int32_t bins, double_pair *re, const double_pair *im) {
-    double_pair sum = {0.0, 0.0};
-    for (int32_t j = 0; j < bins; ++j) {
-        const double_pair power = re[j] * re[j] + im[j] * im[j];
-        re[j] = __builtin_convertvector(__builtin_convertvector(power, float_pair), double_pair);
-        sum += re[j];
-    }
-    return std::isfinite(sum[0]) && std::isfinite(sum[1]);
-}
-
 // Computes the powers of the frames k and next and fills their spectrum rows if the record has any.
 void compute_spectrum(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
                       const worker_scratch *scratch) {
     const int32_t size = worker->frame_size;
-    const int32_t bins = size / 2;
     scale_frames(worker, k, next, scratch->samples);
     const frame_pair frames = {scratch->samples, scratch->samples + (next - k) * worker->hop_size,
                                worker->window};
-    transform_frames(frames, scratch->re, scratch->im, size, worker->fft);
-    if (!compute_powers(bins, scratch->re, scratch->im)) {
-        transform_plainly(frames, scratch->re, scratch->im, size, worker->fft);
-        compute_powers(bins, scratch->re, scratch->im);
-    }
-    for (int32_t j = 0; j < bins && worker->spectrum != nullptr; ++j) {
-        worker->spectrum[k][j] = static_cast<float>(scratch->re[j][0]);
-        worker->spectrum[next][j] = static_cast<float>(scratch->re[j][1]);
+    compute_frame_powers(frames, size, worker->fft, scratch->transform, scratch->powers);
+    for (int32_t j = 0; j < size / 2 && worker->spectrum != nullptr; ++j) {
+        worker->spectrum[k][j] = static_cast<float>(scratch->powers[j][0]);
+        worker->spectrum[next][j] = static_cast<float>(scratch->powers[j][1]);
     }
 }
 

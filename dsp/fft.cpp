@@ -8,7 +8,7 @@ namespace {
 
 constexpr uint32_t kMaxReverseBits = 31;  // bit_reverse2 returns 0 beyond it
 
-int32_t count_halvings(int32_t n) {
+int32_t count_halvings(size_t n) {
     int32_t count = 0;
     for (; n > 1; n /= 2) ++count;
     return count;
@@ -123,16 +123,16 @@ void run_two_stages(const spectrum<T> &x, size_t half, size_t size, const TAVO_F
     }
 }
 
-// Runs the stages from the one on whose butterflies have inputs half elements apart.
+// Runs the stages from the one whose butterflies have inputs half elements apart to the one before
+// end elements.
 template <typename T>
-void run_stages(const spectrum<T> &x, size_t half, const TAVO_FFT_CTX *ctx) {
-    const size_t size = size_t{1} << ctx->stages;
-    const int32_t done = count_halvings(static_cast<int32_t>(half));
-    if ((ctx->stages - done) % 2 != 0) {
+void run_stages(const spectrum<T> &x, size_t half, size_t end, size_t size,
+                const TAVO_FFT_CTX *ctx) {
+    if (count_halvings(end / half) % 2 != 0) {
         run_stage(x, half, size, ctx);
         half *= 2;
     }
-    for (; half < size; half *= 4) run_two_stages(x, half, size, ctx);
+    for (; half < end; half *= 4) run_two_stages(x, half, size, ctx);
 }
 
 // Radix 2, decimation in time.
@@ -140,7 +140,8 @@ template <typename T>
 void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
     if (!has_tables(ctx, n)) return;
     permute(re, im, n, ctx->bit_reverse);
-    run_stages<T>({re, im}, 1, ctx);
+    const auto size = static_cast<size_t>(n);
+    run_stages<T>({re, im}, 1, size, size, ctx);
 }
 
 // The outputs of a butterfly of two real values.
@@ -202,13 +203,40 @@ size_t next_reversed(size_t x, size_t limit) {
     return x + bit;
 }
 
+inline double_pair power_of(const complex<double_pair> &x) {
+    const double_pair power = x.re * x.re + x.im * x.im;
+    return __builtin_convertvector(__builtin_convertvector(power, float_pair), double_pair);
+}
+
+// Runs the last two stages for the powers of the bins below size / 2 alone. Returns the sum of all
+// powers.
+double_pair finish_powers(const spectrum<double_pair> &x, size_t size, const TAVO_FFT_CTX *ctx,
+                          double_pair *powers) {
+    const size_t half = size / 4;
+    double_pair sum = {0.0, 0.0};
+    for (size_t j = 0; j < half; ++j) {
+        complex<double_pair> a = load(x, j);
+        complex<double_pair> b = load(x, j + half);
+        complex<double_pair> c = load(x, j + 2 * half);
+        complex<double_pair> d = load(x, j + 3 * half);
+        butterfly(&a, &b, twiddle(ctx, 2 * j));
+        butterfly(&c, &d, twiddle(ctx, 2 * j));
+        butterfly(&a, &c, twiddle(ctx, j));
+        butterfly(&b, &d, twiddle(ctx, j + half));
+        powers[j] = power_of(a);
+        powers[j + half] = power_of(b);
+        sum += powers[j] + powers[j + half];
+    }
+    return sum;
+}
+
 }  // namespace
 
 void tavo_fft_init(int16_t n, TAVO_FFT_CTX *ctx) {
     *ctx = {};
     if (!is_fft_size(n)) return;
     const auto size = static_cast<size_t>(n);
-    ctx->stages = count_halvings(n);
+    ctx->stages = count_halvings(size);
     ctx->cos_table = static_cast<double *>(calloc(size, sizeof(double)));
     ctx->sin_table = static_cast<double *>(calloc(size, sizeof(double)));
     ctx->bit_reverse = static_cast<uint32_t *>(calloc(size, sizeof(uint32_t)));
@@ -226,29 +254,23 @@ double *tavo_fft_proc(double *re, double *im, int16_t n, const TAVO_FFT_CTX *ctx
     return re;
 }
 
-void transform_plainly(const frame_pair &frames, double_pair *re, double_pair *im, int32_t n,
-                       const TAVO_FFT_CTX *ctx) {
-    for (int32_t i = 0; i < n; ++i) {
-        re[i] = windowed(frames, static_cast<size_t>(i));
-        im[i] = double_pair{0.0, 0.0};
-    }
-    transform(re, im, n, ctx);
-}
-
-void transform_frames(const frame_pair &frames, double_pair *re, double_pair *im, int32_t n,
-                      const TAVO_FFT_CTX *ctx) {
+void compute_frame_powers(const frame_pair &frames, int32_t n, const TAVO_FFT_CTX *ctx,
+                          double_pair *scratch, double_pair *powers) {
     const auto size = static_cast<size_t>(n);
-    if (!has_tables(ctx, n) || size < kFirstGroup) {
-        transform_plainly(frames, re, im, n, ctx);
-        return;
+    const spectrum<double_pair> x = {scratch, scratch + size};
+    if (has_tables(ctx, n) && size >= 4 * kFirstGroup) {
+        size_t reversed = 0;
+        for (size_t first = 0; first < size; first += kFirstGroup) {
+            start_group(frames, reversed, size / kFirstGroup, first, x, ctx);
+            reversed = next_reversed(reversed, size / kFirstGroup);
+        }
+        run_stages(x, kFirstGroup, size / 4, size, ctx);
+        const double_pair sum = finish_powers(x, size, ctx, powers);
+        if (std::isfinite(sum[0]) && std::isfinite(sum[1])) return;
     }
-    const size_t groups = size / kFirstGroup;
-    size_t reversed = 0;
-    for (size_t first = 0; first < size; first += kFirstGroup) {
-        start_group(frames, reversed, groups, first, {re, im}, ctx);
-        reversed = next_reversed(reversed, groups);
-    }
-    run_stages<double_pair>({re, im}, kFirstGroup, ctx);
+    for (size_t i = 0; i < size; ++i) store(x, i, {windowed(frames, i), double_pair{0.0, 0.0}});
+    transform(x.re, x.im, n, ctx);
+    for (size_t j = 0; j < size / 2; ++j) powers[j] = power_of(load(x, j));
 }
 
 void tavo_fft_deinit(TAVO_FFT_CTX *ctx) {

@@ -49,12 +49,10 @@ struct frame_pair {
     const double *window;  // [n]
 };
 
-// Transforms two windowed frames to re[n], im[n], bit-identical to tavo_fft_proc on each frame.
-void transform_plainly(const frame_pair &frames, double_pair *re, double_pair *im, int32_t n,
-                       const TAVO_FFT_CTX *ctx);
-
-// The same, faster, for results that are all finite; zeros may have the other sign.
-void transform_frames(const frame_pair &frames, double_pair *re, double_pair *im, int32_t n,
-                      const TAVO_FFT_CTX *ctx);
+// Computes the powers of the bins below n / 2 of two windowed frames, n as given to init, each
+// rounded to single precision: powers[n / 2]. Bit-identical to those after tavo_fft_proc on each
+// frame. scratch: [2 n].
+void compute_frame_powers(const frame_pair &frames, int32_t n, const TAVO_FFT_CTX *ctx,
+                          double_pair *scratch, double_pair *powers);
 
 #endif
