@@ -140,6 +140,7 @@ double mp4_offset_ms(file_bytes &file, int32_t rate) {
     box header;
     if (!find_path(movie, all, {"mvhd"}, header)) return 0.0;
     const double movie_scale = std::max(time_scale(movie, header), 1.0);
+    const double tag_ms = tag_offset_ms(movie, rate);
     box track;
     for (size_t at = 0; find_box(movie, all, "trak", at, track); at = track.end) {
         box part;
@@ -149,10 +150,10 @@ double mp4_offset_ms(file_bytes &file, int32_t rate) {
         const double media_scale = std::max(time_scale(movie, part), 1.0);
         double ms = 0.0;
         if (!find_path(movie, track, {"edts", "elst"}, part)) break;
-        if (read_edits(movie, part, movie_scale, media_scale, ms)) return ms;
-        break;
+        if (!read_edits(movie, part, movie_scale, media_scale, ms)) break;
+        return tag_ms > 0.0 ? std::max(ms, tag_ms) : ms;  // players apply the longer one
     }
-    return tag_offset_ms(movie, rate);
+    return tag_ms;
 }
 
 }  // namespace
