@@ -15,7 +15,7 @@ tests=(
   python3 python3-numpy python3-selenium chromium chromium-driver sqlite3 clang-format clang-tidy
   ffmpeg flac lame vorbis-tools
   doxygen groff-base zsh fish
-  devscripts abigail-tools mypy python3-jsonschema python3-venv python3-pip python3-setuptools python3-wheel
+  devscripts abigail-tools mypy python3-jsonschema python3-mir-eval python3-venv python3-pip python3-setuptools python3-wheel
 )
 web=(emscripten node-acorn nlohmann-json3-dev) # tavo.html: cmake --preset web
 cluster=(slurm-wlm munge postgresql postgresql-client) # scripts/test-cluster.sh
