@@ -8,13 +8,12 @@
 #include <vector>
 
 #include "cli/input/shard.h"
+#include "include/tavo.h"
 
 enum class result_format {
-    none,  // nothing: the store has the results
     text,
     json,
     csv,
-    print,  // --print
     // marker files
     labels,
     kdenlive,
@@ -24,10 +23,13 @@ enum class result_format {
     fcpxml,
     otio,
     reaper,
+    // without a word for --format
+    print,  // --print
+    none,   // nothing: the store has the results
 };
 
 struct options {
-    int32_t mode = 0;           // TAVO_MODE_*
+    int32_t mode = TAVO_MODE_BOTH;
     int32_t length_s = 0;       // 0 for none
     int32_t max_beats = 0;      // 0 for no limit
     int32_t max_minutes = 600;  // longer audio is refused

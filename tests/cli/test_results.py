@@ -2,6 +2,7 @@
 import csv
 import io
 import os
+import shlex
 import struct
 import subprocess
 
@@ -11,6 +12,7 @@ KEYS = ["file", "mode", "status", "sample_rate", "channels", "duration_ms", "off
 BEATS = ["bpm", "beat_count", "beats_ms"]
 ASF = bytes.fromhex("3026b2758e66cf11a6d900aa0062ce6c")
 
+EMPTY = "--clip --click --report --print --format --output-dir --store --fps --shard --files-from".split()
 USAGE = [
     ("", "name at least one"), ("--mode all a.wav", "--mode"), ("--format xml a.wav", "--format"),
     ("--length -1 a.wav", "--length"), ("--length 30.5 a.wav", "'30.5' is not a whole number of seconds"),
@@ -24,6 +26,7 @@ USAGE = [
     ("--report p --click p a.wav", "name one file"), ("--click c.wav -", "--click takes exactly one"),
     ("--embed a.wav", "--report"), ("--fade 1 a.wav", "about --clip"), ("--clip c.mp3 a.wav", "needs --length"),
     ("--clip c.mp3 -l 9 .", "a folder for the clips"), ("--clip c -l 9 a.wav", "an ending"),
+    *((f"{name} '' a.wav", f"{name}: the value is empty") for name in EMPTY),
     ("--clip c.mp3 -l 9 --fade 5 a.wav", "at most half"), ("--clip c.mp3 -l 9 --no-ffmpeg a.wav", "needs the ffmpeg"),
     ("--normalize --no-ffmpeg a.wav", "needs the ffmpeg"), ("--normalize -m beats a.wav", "needs a highlight"),
     ("--normalize --store a.db a.wav", "does not go with --store"),
@@ -55,7 +58,7 @@ def clock(ms):
 class Results(Case):
     def test_wrong_usage(self):
         for words, said in USAGE:
-            done = self.run_tavo(*words.split(), status=2, said=said.encode(), printed=b"")
+            done = self.run_tavo(*shlex.split(words), status=2, said=said.encode(), printed=b"")
             self.assertIn(b"--help", done.stderr)
         self.assert_only()
 
