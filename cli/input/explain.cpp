@@ -18,26 +18,21 @@ constexpr int64_t kMsPerMinute = 60'000;
 
 std::string seconds_text(int64_t ms) {
     std::array<char, 32> text{};
-    snprintf(text.data(), text.size(), "%lld.%03lld", static_cast<long long>(ms / 1000),
-             static_cast<long long>(ms % 1000));
+    snprintf(text.data(), text.size(), "%.3f", static_cast<double>(ms) / 1000);
     return text.data();
 }
 
 // Reads the start and the end of the file, where its format is described, to find a read error that
 // the library's code does not name. Returns errno or 0.
 int find_read_error(const std::string &path) {
-    constexpr int64_t kBlockBytes = 1 << 20;
-    constexpr int64_t kBlocks = 64;  // at each end
-    file_bytes file;
-    if (!open_bytes(file, path)) return errno;
-    const int64_t end_blocks = std::max(file.size - kBlocks * kBlockBytes, kBlocks * kBlockBytes);
-    for (const int64_t start : {int64_t{0}, end_blocks}) {
-        for (int64_t i = 0; i < kBlocks && file.error == 0; ++i) {
-            if (read_bytes(file, start + i * kBlockBytes, kBlockBytes).empty()) break;
-        }
-    }
-    close_bytes(file);
-    return file.error;
+    constexpr int64_t kReadBytes = 64 << 20;  // at each end
+    int code = 0;
+    struct stat info {};
+    if (stat(path.c_str(), &info) != 0) return errno;
+    read_bytes(path, 0, kReadBytes, code);
+    const int64_t end_start = std::max(info.st_size - kReadBytes, kReadBytes);
+    if (code == 0) read_bytes(path, end_start, kReadBytes, code);
+    return code;
 }
 
 std::string explain_format(file_kind kind) {
@@ -100,14 +95,12 @@ failure check_file(const std::string &path) {
     }
     if (S_ISDIR(info.st_mode)) return {"This is a folder, not a file."};
     if (!S_ISREG(info.st_mode)) return {"This is a device, pipe or socket, not a file."};
-    file_bytes file;
-    if (!open_bytes(file, path)) return {system_sentence("The file cannot be read", errno)};
-    const std::string head = read_bytes(file, 0, TAVO_MIN_FILE_BYTES);
-    close_bytes(file);
-    if (file.error != 0) return {system_sentence("The file cannot be read", file.error)};
-    if (head.empty()) return {"The file is empty."};
-    if (head.size() == TAVO_MIN_FILE_BYTES) return {};
-    return {"The file is too short to be audio: it has " + std::to_string(head.size()) + " bytes."};
+    int code = 0;
+    const size_t size = read_bytes(path, 0, TAVO_MIN_FILE_BYTES, code).size();
+    if (code != 0) return {system_sentence("The file cannot be read", code)};
+    if (size == 0) return {"The file is empty."};
+    if (size == TAVO_MIN_FILE_BYTES) return {};
+    return {"The file is too short to be audio: it has " + std::to_string(size) + " bytes."};
 }
 
 failure explain_refusal(const std::string &path, int32_t code, record &result) {

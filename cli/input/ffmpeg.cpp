@@ -9,6 +9,7 @@
 #include <cerrno>
 
 #include "cli/input/ffmpeg_process.h"
+#include "cli/system.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
 
@@ -31,35 +32,31 @@ constexpr const char *kMediaSuffixes[] = {
 
 // The sound of one run as it comes.
 struct decoding {
-    int fd;
-    int64_t most_minutes;
+    int fd;              // where it goes
     int64_t file_bytes;  // of the encoded file
-    std::string header;  // its first kHeaderBytes
-    int64_t bytes = 0;   // written to fd
-    int32_t rate = 0;    // Hz; 0 until the header is there
+    int64_t most_minutes;
+    std::string header = {};  // its first kHeaderBytes
+    int64_t bytes = 0;
+    int32_t rate = 0;  // Hz; 0 until the header is complete
 };
 
-int32_t rate_of(const std::string &header) {
+int32_t read_rate(const std::string &header) {
     uint32_t rate = 0;
-    for (size_t i = 0; i < 4; ++i) {
-        rate |= static_cast<uint32_t>(static_cast<uint8_t>(header[kRateOffset + i])) << (8 * i);
-    }
+    for (size_t i = 4; i-- > 0;) rate = rate << 8 | static_cast<uint8_t>(header[kRateOffset + i]);
     return static_cast<int32_t>(rate);
 }
 
-failure store_sound(decoding &sound, const char *data, size_t size) {
-    for (size_t done = 0; done < size;) {
-        const ssize_t got = write(sound.fd, data + done, size - done);
-        if (got < 0 && errno != EINTR) {
-            return {system_sentence("The decoded sound cannot be held in memory", errno)};
-        }
-        if (got > 0) done += static_cast<size_t>(got);
-    }
-    sound.bytes += static_cast<int64_t>(size);
+failure cannot_hold(int code) {
+    return {system_sentence("The decoded sound cannot be held in memory", code)};
+}
+
+failure store_sound(decoding &sound, std::string_view part) {
+    if (const int code = write_all(sound.fd, part)) return cannot_hold(code);
+    sound.bytes += static_cast<int64_t>(part.size());
     if (sound.rate == 0) {
-        sound.header.append(data, std::min(size, kHeaderBytes - sound.header.size()));
+        sound.header += part.substr(0, kHeaderBytes - sound.header.size());
         if (sound.header.size() < kHeaderBytes) return {};
-        sound.rate = rate_of(sound.header);
+        sound.rate = read_rate(sound.header);
         if (sound.rate < TAVO_MIN_RATE || sound.rate > TAVO_MAX_RATE) {
             return {"ffmpeg decodes it at " + std::to_string(sound.rate) +
                     " Hz, which is not read."};
@@ -67,19 +64,14 @@ failure store_sound(decoding &sound, const char *data, size_t size) {
     }
     const int64_t samples = sound.bytes / 2;
     if (samples > sound.most_minutes * 60 * sound.rate || sound.bytes > kMostWavBytes) {
-        return {"The audio is longer than " + std::to_string(sound.most_minutes) + " minutes."};
+        return {"The audio is longer than " +
+                count_text(static_cast<size_t>(sound.most_minutes), "minute") + "."};
     }
     if (samples / kMostSamplesPerByte >
         sound.file_bytes + kSpareSeconds * sound.rate / kMostSamplesPerByte) {
         return {"The audio is longer than a file of its size can hold."};
     }
     return {};
-}
-
-int64_t size_of_file(const std::string &path, int fd) {
-    struct stat info {};
-    const int code = fd >= 0 ? fstat(fd, &info) : stat(path.c_str(), &info);
-    return code == 0 ? info.st_size : 0;
 }
 
 // Without tags the header has a fixed size.
@@ -94,34 +86,29 @@ std::vector<std::string> wav_output(const std::string &filter, int32_t rate) {
 }
 
 failure decode_once(const ffmpeg_task &task, int stop_fd, decoding &sound) {
-    if (ftruncate(sound.fd, 0) != 0 || lseek(sound.fd, 0, SEEK_SET) != 0) {
-        return {system_sentence("The decoded sound cannot be held in memory", errno)};
-    }
-    return run_ffmpeg(task, stop_fd, [&sound](const char *data, size_t size) {
-        return store_sound(sound, data, size);
-    });
+    if (ftruncate(sound.fd, 0) != 0 || lseek(sound.fd, 0, SEEK_SET) != 0) return cannot_hold(errno);
+    return run_ffmpeg(task, stop_fd,
+                      [&sound](std::string_view part) { return store_sound(sound, part); });
 }
 
 }  // namespace
 
-failure decode_with_ffmpeg(const ffmpeg_limits &limits, const std::string &path, int fd,
-                           int stop_fd, int &sound_fd) {
+failure decode_with_ffmpeg(const options &opts, const std::string &path, int fd,
+                           const std::string &filter, int stop_fd, int &sound_fd) {
     sound_fd = memfd_create("sound", MFD_CLOEXEC);
-    if (sound_fd < 0) return {system_sentence("The decoded sound cannot be held in memory", errno)};
-    const int64_t file_bytes = size_of_file(path, fd);
-    decoding sound{sound_fd, limits.minutes, file_bytes, "", 0, 0};
-    failure failed =
-        decode_once({limits.program, path, fd, wav_output(limits.filter, 0)}, stop_fd, sound);
+    if (sound_fd < 0) return cannot_hold(errno);
+    struct stat info {};
+    const int code = fd >= 0 ? fstat(fd, &info) : stat(path.c_str(), &info);
+    const decoding start = {sound_fd, code == 0 ? info.st_size : 0, opts.max_minutes};
+    decoding sound = start;
+    failure failed = decode_once({opts.ffmpeg, path, fd, wav_output(filter, 0)}, stop_fd, sound);
     const int32_t accepted = std::clamp<int32_t>(sound.rate, TAVO_MIN_RATE, TAVO_MAX_RATE);
     if (sound.rate > 0 && sound.rate != accepted) {
-        sound = {sound_fd, limits.minutes, file_bytes, "", 0, 0};
-        failed = decode_once({limits.program, path, fd, wav_output(limits.filter, accepted)},
-                             stop_fd, sound);
+        sound = start;
+        failed = decode_once({opts.ffmpeg, path, fd, wav_output(filter, accepted)}, stop_fd, sound);
     }
     if (!failed && sound.rate == 0) failed = {"ffmpeg decodes nothing of it."};
-    if (!failed) return {};
-    close(sound_fd);
-    sound_fd = -1;
+    if (failed) close_fd(sound_fd);
     return failed;
 }
 

@@ -4,7 +4,6 @@
 #include <poll.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
-#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -16,7 +15,11 @@
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
+#include <iterator>
+#include <sstream>
 
+#include "cli/system.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
@@ -25,7 +28,8 @@ namespace {
 constexpr size_t kMostMessageBytes = 65536;  // of the program's messages; the first line counts
 // Address space: a damaged file makes it allocate hours of silence at once.
 constexpr rlim_t kMostProgramBytes = rlim_t{768} << 20;
-constexpr int kEndPollMs = 10;  // between two looks at a program that is ending
+constexpr int kReadPollMs = 1000;  // between two looks at the clock
+constexpr int kEndPollMs = 10;     // between two looks at a program that is ending
 
 // Containers that hold their sound themselves. Playlists and scripts (HLS, concat, DASH, SDP, image
 // sequences), which name other files, are not among them.
@@ -35,18 +39,13 @@ constexpr const char *kContainers =
     "mpc,mpc8,mpeg,mpegts,mxf,nut,ogg,oma,rm,shn,sox,tak,truehd,tta,voc,w64,wav,wv,xwma";
 
 struct ffmpeg_process {
-    pid_t pid = -1;
+    pid_t pid = -1;       // -1 once it was reaped
     int sound_fd = -1;    // standard output
     int message_fd = -1;  // standard error
     std::string message;
 };
 
 using clock_type = std::chrono::steady_clock;
-
-void close_fd(int &fd) {
-    if (fd >= 0) close(fd);
-    fd = -1;
-}
 
 // The prefix makes any name a file's: -x.mp3, http://x, a:b.mp3.
 std::string input_name(const ffmpeg_task &task) {
@@ -80,9 +79,9 @@ std::vector<std::string> command_line(const ffmpeg_task &task) {
 // Returns 0 or errno.
 int start_ffmpeg(const ffmpeg_task &task, ffmpeg_process &process) {
     std::vector<std::string> words = command_line(task);
-    std::vector<char *> pointers;
-    for (std::string &word : words) pointers.push_back(word.data());
-    pointers.push_back(nullptr);
+    std::vector<char *> pointers(words.size() + 1, nullptr);
+    std::transform(words.begin(), words.end(), pointers.begin(),
+                   [](std::string &word) { return word.data(); });
     int sound[2] = {-1, -1};
     int messages[2] = {-1, -1};
     int input =
@@ -99,56 +98,38 @@ int start_ffmpeg(const ffmpeg_task &task, ffmpeg_process &process) {
     return code;
 }
 
-// Hands over what has come. Closes the descriptor at its end.
-failure read_sound(ffmpeg_process &process, const byte_sink &sink) {
+// Reads what has come; nothing at the end, which closes fd.
+std::string_view read_part(int &fd, std::array<char, 65536> &part) {
+    const ssize_t got = read(fd, part.data(), part.size());
+    if (got == 0 || (got < 0 && errno != EINTR)) close_fd(fd);
+    return {part.data(), static_cast<size_t>(std::max<ssize_t>(got, 0))};
+}
+
+// Reads both pipes until they end, then waits for the end of the process, whose status it stores.
+failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink, int &status) {
     std::array<char, 65536> part;
-    const ssize_t got = read(process.sound_fd, part.data(), part.size());
-    if (got > 0) return sink(part.data(), static_cast<size_t>(got));
-    if (got == 0 || errno != EINTR) close_fd(process.sound_fd);
-    return {};
-}
-
-void read_message(ffmpeg_process &process) {
-    std::array<char, 1024> part;
-    const ssize_t got = read(process.message_fd, part.data(), part.size());
-    if (got == 0 || (got < 0 && errno != EINTR)) close_fd(process.message_fd);
-    if (got > 0 && process.message.size() < kMostMessageBytes) {
-        process.message.append(part.data(), static_cast<size_t>(got));
-    }
-}
-
-failure ended_idle() {
-    return {"ffmpeg made no progress for " + std::to_string(kIdleSeconds) + " s and was ended."};
-}
-
-// Reads both pipes until they end.
-failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink) {
     auto deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
-    while (process.sound_fd >= 0 || process.message_fd >= 0) {
-        std::array<pollfd, 3> watched = {
-            {{process.sound_fd, POLLIN, 0}, {process.message_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}}};
-        const auto left =
-            std::chrono::ceil<std::chrono::milliseconds>(deadline - clock_type::now());
-        if (left.count() <= 0) return ended_idle();
-        if (poll(watched.data(), watched.size(), static_cast<int>(left.count())) < 0) continue;
+    while (process.pid >= 0) {
+        pollfd watched[] = {
+            {process.sound_fd, POLLIN, 0}, {process.message_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
+        const bool is_ending = process.sound_fd < 0 && process.message_fd < 0;
+        poll(watched, std::size(watched), is_ending ? kEndPollMs : kReadPollMs);
         if (watched[2].revents != 0) return {"The analysis was stopped."};
-        if (watched[1].revents != 0) read_message(process);
-        if (watched[0].revents == 0) continue;
-        deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
-        if (failure failed = read_sound(process, sink)) return failed;
+        if (clock_type::now() > deadline) {
+            return {"ffmpeg made no progress for " + std::to_string(kIdleSeconds) +
+                    " s and was ended."};
+        }
+        if (watched[1].revents != 0) {
+            const std::string_view text = read_part(process.message_fd, part);
+            if (process.message.size() < kMostMessageBytes) process.message += text;
+        }
+        if (watched[0].revents != 0) {
+            deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
+            if (failure failed = sink(read_part(process.sound_fd, part))) return failed;
+        }
+        if (is_ending && waitpid(process.pid, &status, WNOHANG) > 0) process.pid = -1;
     }
     return {};
-}
-
-// The process has closed its pipes and ends. Returns false if it does not in time.
-bool wait_for_end(ffmpeg_process &process, int stop_fd, int &status) {
-    const auto deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
-    pollfd watched = {stop_fd, POLLIN, 0};
-    while (waitpid(process.pid, &status, WNOHANG) == 0) {
-        if (clock_type::now() > deadline || poll(&watched, 1, kEndPollMs) > 0) return false;
-    }
-    process.pid = -1;
-    return true;
 }
 
 // Harmless after the end.
@@ -176,53 +157,37 @@ std::string first_line(const ffmpeg_task &task, const std::string &message) {
 }
 
 failure explain_end(const ffmpeg_task &task, const std::string &message, int status) {
-    if (WIFSIGNALED(status)) {
-        const int number = WTERMSIG(status);
-        return {"ffmpeg was ended by signal " + std::to_string(number) + " (" + strsignal(number) +
-                ")."};
-    }
+    if (WIFSIGNALED(status)) return {"ffmpeg was ended " + ending_text(status) + "."};
     const bool is_cut = message.find(strerror(EIO)) != std::string::npos;  // a bad sector
     if (WEXITSTATUS(status) == 0 && !is_cut) return {};
     const std::string line = first_line(task, message);
-    if (line.empty())
-        return {"ffmpeg ended with status " + std::to_string(WEXITSTATUS(status)) + "."};
-    return {"ffmpeg: " + line + "."};
+    return {line.empty() ? "ffmpeg ended " + ending_text(status) + "." : "ffmpeg: " + line + "."};
 }
 
 }  // namespace
 
 std::string find_ffmpeg() {
     const char *variable = getenv("PATH");
-    const std::string folders = variable == nullptr ? "" : variable;
-    for (size_t start = 0; start < folders.size();) {
-        const size_t end = std::min(folders.find(':', start), folders.size());
-        const std::string path = folders.substr(start, end - start) + "/ffmpeg";
-        struct stat info {};
-        if (path.front() == '/' && stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode) &&
-            access(path.c_str(), X_OK) == 0) {
+    std::istringstream folders(variable == nullptr ? "" : variable);
+    for (std::string folder; std::getline(folders, folder, ':');) {
+        const std::string path = folder + "/ffmpeg";
+        std::error_code ignored;
+        if (path.front() == '/' && access(path.c_str(), X_OK) == 0 &&
+            std::filesystem::is_regular_file(path, ignored)) {
             return path;
         }
-        start = end + 1;
     }
     return "";
 }
 
 failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink) {
     ffmpeg_process process;
+    int status = 0;
     const int code = start_ffmpeg(task, process);
     failure failed;
     if (code != 0) failed = {system_sentence("ffmpeg could not be started", code)};
-    if (!failed) failed = read_pipes(process, stop_fd, sink);
-    int status = 0;
-    if (!failed) {
-        failed = wait_for_end(process, stop_fd, status) ? explain_end(task, process.message, status)
-                                                        : ended_idle();
-    }
+    if (!failed) failed = read_pipes(process, stop_fd, sink, status);
+    if (!failed) failed = explain_end(task, process.message, status);
     kill_ffmpeg(process);
     return failed;
-}
-
-bool is_stop_requested(int stop_fd) {
-    pollfd watched = {stop_fd, POLLIN, 0};
-    return poll(&watched, 1, 0) > 0;
 }

@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <functional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "cli/failure.h"
@@ -20,9 +21,9 @@ struct ffmpeg_task {
 };
 
 // Receives what the program writes to its standard output. A failure ends the program.
-using byte_sink = std::function<failure(const char *data, size_t size)>;
+using byte_sink = std::function<failure(std::string_view bytes)>;
 
-// Path of the ffmpeg program that PATH leads to, empty if there is none.
+// Path of the ffmpeg program that PATH leads to; empty if PATH leads to none.
 std::string find_ffmpeg();
 
 // Returns after the program has ended: by itself, at a stop (stop_fd readable or closed at its
@@ -35,8 +36,5 @@ constexpr int kIdleSeconds = 30;
 
 // Players start their time line at 0 and play gaps as silence: so does this filter.
 constexpr const char *kPlayerTimeFilter = "aresample=async=1:first_pts=0";
-
-// True once stop_fd is readable or closed at its other end.
-bool is_stop_requested(int stop_fd);
 
 #endif

@@ -1,28 +1,19 @@
-// Bytes at any offset of a regular file. Reading goes on after interruptions and short reads.
+// Bytes of files, and numbers in them.
 #ifndef TAVO_CLI_INPUT_FILE_BYTES_H
 #define TAVO_CLI_INPUT_FILE_BYTES_H
 
 #include <cstdint>
 #include <string>
+#include <string_view>
 
-struct file_bytes {
-    int fd = -1;
-    int64_t size = 0;
-    int error = 0;  // errno of the first read that failed
-};
+// Returns up to size bytes of a regular file from offset on: fewer at the file's end or after an
+// error, whose errno code receives, else 0. Any other kind of file counts as empty. Never blocks.
+std::string read_bytes(const std::string &path, int64_t offset, int64_t size, int &code);
 
-// Never blocks. False with errno set when the file cannot be opened; anything but a regular file is
-// opened as an empty one.
-bool open_bytes(file_bytes &file, const std::string &path);
-void close_bytes(file_bytes &file);
-
-// Up to size bytes from offset on; fewer at the file's end or after an error.
-std::string read_bytes(file_bytes &file, int64_t offset, size_t size);
-
-// Big-endian number of size bytes at offset; 0 where the text does not have them.
-uint64_t big_endian(const std::string &bytes, size_t offset, size_t size);
+// Big-endian number of size bytes at offset; 0 if bytes does not contain them.
+uint64_t big_endian(std::string_view bytes, size_t offset, size_t size);
 
 // Offset of the first byte after the ID3v2 tags at the file's start; 0 without a tag.
-int64_t id3v2_end(file_bytes &file);
+int64_t find_id3v2_end(const std::string &path, int &code);
 
 #endif

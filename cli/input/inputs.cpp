@@ -1,10 +1,14 @@
 #include "cli/input/inputs.h"
 
-#include <dirent.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <filesystem>
+#include <functional>
+#include <iterator>
+#include <optional>
+#include <utility>
 
 #include "cli/input/ffmpeg.h"
 #include "cli/input/recognise.h"
@@ -18,10 +22,6 @@
 namespace {
 
 constexpr size_t kStepsAtOnce = 64;  // files and folders looked at between two looks at the stop
-
-std::string joined(const std::string &folder, const std::string &name) {
-    return folder.back() == '/' ? folder + name : folder + "/" + name;
-}
 
 void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
@@ -64,47 +64,24 @@ bool claim_targets(input_supply &supply, input &entry) {
            (opts.clip.empty() || claim_target(supply, entry, clip_path(entry.path, opts)));
 }
 
-// The entries' names in the order of their bytes. Returns 0 or errno.
-int list_folder(open_folder &folder) {
-    DIR *stream = opendir(folder.path.c_str());
-    if (stream == nullptr) return errno;
-    errno = 0;
-    while (const dirent *entry = readdir(stream)) {
-        const std::string name = entry->d_name;
-        if (name != "." && name != "..") folder.names.push_back(name);
+// Adds a folder's entries, unless this search has entered it before, through another link.
+failure enter_folder(input_supply &supply, const std::string &path, const struct stat &info) {
+    if (!supply.searched.insert(id_of(info)).second) return {};
+    std::vector<std::string> entries;
+    std::error_code code;
+    std::filesystem::directory_iterator entry(path, code);
+    for (; !code && entry != std::filesystem::directory_iterator(); entry.increment(code)) {
+        entries.push_back(entry->path());
     }
-    const int code = errno;
-    closedir(stream);
-    std::sort(folder.names.begin(), folder.names.end());
-    return code;
+    if (code) return {system_sentence("The folder cannot be read", code.value())};
+    std::sort(entries.begin(), entries.end(), std::greater<>());  // the order of their bytes
+    std::move(entries.begin(), entries.end(), std::back_inserter(supply.entries));
+    return {};
 }
 
-// Begins to search a folder, unless this search has entered it before, through another link.
-// True when there is an input to hand out instead.
-bool enter_folder(input_supply &supply, const std::string &path, const struct stat &info,
-                  input &out) {
-    if (supply.folders.empty()) {
-        supply.found = supply.skipped = 0;
-        supply.searched.clear();
-    }
-    if (!supply.searched.insert(id_of(info)).second) return false;
-    open_folder folder;
-    folder.path = path;
-    const int code = list_folder(folder);
-    if (code != 0) {
-        out = {path, {system_sentence("The folder cannot be read", code)}};
-        ++supply.found;
-        return true;
-    }
-    supply.folders.push_back(std::move(folder));
-    return false;
-}
-
-// The innermost folder holds no more. True for an input that says that there was no audio.
+// True if the folder becomes an input, because it holds no audio.
 bool leave_folder(input_supply &supply, input &out) {
-    const std::string path = supply.folders.back().path;
-    supply.folders.pop_back();
-    if (!supply.folders.empty()) return false;
+    const std::string path = std::exchange(supply.folder, "");
     if (supply.found == 0) {
         const char *hint =
             supply.opts.recursive ? "." : " itself; --recursive searches the folders in it.";
@@ -118,11 +95,13 @@ bool leave_folder(input_supply &supply, input &out) {
     return false;
 }
 
-// True if the file is to be analysed or reported; code receives errno when it cannot be read.
-bool is_audio(const std::string &path, const options &opts, int &code) {
+// True if the file is to be analysed or reported. Sets refusal if it cannot be read.
+bool is_audio(const std::string &path, const options &opts, failure &refusal) {
     file_kind kind = file_kind::unknown;
-    code = recognise(path, kind);
-    if (code != 0) return code == EACCES || code == EPERM || code == EIO;
+    if (const int code = recognise(path, kind)) {
+        refusal = {system_sentence("The file cannot be read", code)};
+        return code == EACCES || code == EPERM || code == EIO;
+    }
     if (kind != file_kind::unknown) return true;
     if (!opts.ffmpeg.empty() && has_media_suffix(path)) return true;
     // The library finds MPEG audio also after other bytes.
@@ -132,83 +111,85 @@ bool is_audio(const std::string &path, const options &opts, int &code) {
     return probed != TAVO_ERR_FORMAT && probed != TAVO_ERR_READ;
 }
 
-bool take_entry(input_supply &supply, input &out) {
-    open_folder &folder = supply.folders.back();
-    if (folder.next == folder.names.size()) return leave_folder(supply, out);
-    const std::string path = joined(folder.path, folder.names[folder.next++]);
+// The functions below look at one name and return true if they found an input.
+
+bool look_at_entry(input_supply &supply, input &out) {
+    if (supply.entries.empty()) return leave_folder(supply, out);
+    out = {std::move(supply.entries.back()), {}};
+    supply.entries.pop_back();
     struct stat info {};
-    if (stat(path.c_str(), &info) != 0) return false;
-    if (S_ISDIR(info.st_mode)) {
-        return supply.opts.recursive && enter_folder(supply, path, info, out);
+    if (stat(out.path.c_str(), &info) != 0) return false;
+    bool is_found = false;
+    if (S_ISDIR(info.st_mode) && supply.opts.recursive) {
+        out.refusal = enter_folder(supply, out.path, info);
+        is_found = static_cast<bool>(out.refusal);
+    } else if (S_ISREG(info.st_mode)) {
+        is_found = is_audio(out.path, supply.opts, out.refusal);
+        if (!is_found) ++supply.skipped;
     }
-    if (!S_ISREG(info.st_mode)) return false;
-    int code = 0;
-    if (!is_audio(path, supply.opts, code)) {
-        ++supply.skipped;
-        return false;
-    }
-    ++supply.found;
-    out = {path, {code != 0 ? system_sentence("The file cannot be read", code) : ""}};
-    return true;
+    if (is_found) ++supply.found;
+    return is_found;
 }
 
-bool take_path(input_supply &supply, const std::string &path, input &out) {
-    struct stat info {};
-    if (stat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) {
-        return enter_folder(supply, path, info, out);
-    }
+bool look_at_path(input_supply &supply, const std::string &path, input &out) {
     out = {path, {}};
-    return true;
-}
-
-// True for an input; waiting is set when the list has no more for now.
-bool take_from_list(input_supply &supply, input &out, bool &waiting) {
-    std::string name;
-    failure failed;
-    const list_state state = next_name(supply.list, supply.opts.list_separator, name, failed);
-    if (state == list_state::name) return take_path(supply, name, out);
-    waiting = state == list_state::waiting;
-    if (waiting) return false;
-    close_list(supply.list);
-    if (state == list_state::ended && supply.list.names == 0) {
-        add_note(supply, list_text(supply.list) + " names no files.");
-    }
-    out = {supply.list.name, failed};
-    return state == list_state::failed;
-}
-
-bool take_argument(input_supply &supply, input &out) {
-    const options &opts = supply.opts;
-    const size_t index = supply.argument++;
-    const bool listed = index >= opts.inputs.size();
-    const std::string &word = listed ? opts.lists[index - opts.inputs.size()] : opts.inputs[index];
-    if (!listed && word != "-") return take_path(supply, word, out);
-    out = {word, open_list(supply.list, word)};
+    struct stat info {};
+    if (stat(path.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) return true;
+    supply.found = supply.skipped = 0;
+    supply.searched.clear();
+    out.refusal = enter_folder(supply, path, info);
+    if (!out.refusal) supply.folder = path;
     return static_cast<bool>(out.refusal);
 }
 
-// True for an input.
-bool take_next(input_supply &supply, input &out, bool &waiting) {
-    if (!supply.folders.empty()) return take_entry(supply, out);
-    if (supply.list.fd >= 0) return take_from_list(supply, out, waiting);
-    return take_argument(supply, out);
+bool look_at_list(input_supply &supply, input &out) {
+    list_reader &list = supply.list;
+    std::optional<std::string> name;
+    out = {list.name, read_name(list, name)};
+    if (name) return look_at_path(supply, *name, out);
+    if (!out.refusal && !list.ended) return false;
+    if (!out.refusal && list.names == 0) {
+        add_note(supply, (list.name == "-" ? "the list on standard input"
+                                           : "the list " + shown(list.name)) +
+                             " names no files.");
+    }
+    close_list(list);
+    return static_cast<bool>(out.refusal);
+}
+
+bool look_at_argument(input_supply &supply, input &out) {
+    const options &opts = supply.opts;
+    const size_t index = supply.argument++;
+    const bool is_file = index < opts.inputs.size();
+    const std::string &word = is_file ? opts.inputs[index] : opts.lists[index - opts.inputs.size()];
+    if (is_file && word != "-") return look_at_path(supply, word, out);
+    out = {word, open_list(supply.list, word, opts.list_separator)};
+    return static_cast<bool>(out.refusal);
+}
+
+bool look_at_next(input_supply &supply, input &out) {
+    if (!supply.folder.empty()) return look_at_entry(supply, out);
+    if (supply.list.fd >= 0) return look_at_list(supply, out);
+    return look_at_argument(supply, out);
 }
 
 bool is_done(const input_supply &supply) {
-    return supply.folders.empty() && supply.list.fd < 0 &&
+    return supply.folder.empty() && supply.list.fd < 0 &&
            supply.argument == supply.opts.inputs.size() + supply.opts.lists.size();
 }
 
 }  // namespace
 
 supply_state next_input(input_supply &supply, input &out) {
-    bool waiting = false;
-    for (size_t steps = 0; !is_done(supply) && !waiting; ++steps) {
+    for (size_t steps = 0; !is_done(supply); ++steps) {
         if (steps == kStepsAtOnce) return supply_state::searching;
-        if (!take_next(supply, out, waiting)) continue;
-        if (out.refusal || claim_targets(supply, out)) return supply_state::ready;
+        const bool is_list = supply.folder.empty() && supply.list.fd >= 0;
+        if (look_at_next(supply, out)) {
+            if (out.refusal || claim_targets(supply, out)) return supply_state::ready;
+        } else if (is_list && supply.folder.empty() && supply.list.fd >= 0) {
+            return supply_state::waiting;  // for the next name
+        }
     }
-    if (waiting) return supply_state::waiting;
     if (supply.existing > 0) {
         add_note(supply, count_text(supply.existing, "input") + " left out: the file is there.");
         supply.existing = 0;

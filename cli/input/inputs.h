@@ -23,21 +23,15 @@ struct input {
 
 using file_id = std::pair<dev_t, ino_t>;
 
-// A folder that is being searched.
-struct open_folder {
-    std::string path;
-    std::vector<std::string> names;  // of its entries, in the order of their bytes
-    size_t next = 0;                 // name to look at
-};
-
 struct input_supply {
     const options &opts;
     size_t argument = 0;                    // next of opts.inputs, then of opts.lists
     list_reader list = {};                  // being read
-    std::vector<open_folder> folders = {};  // being searched, the innermost last
-    std::set<file_id> searched = {};        // folders entered since the outermost of them
-    size_t found = 0;                       // audio files in the outermost of them
-    size_t skipped = 0;                     // other files there
+    std::string folder = {};                // being searched; empty for none
+    std::vector<std::string> entries = {};  // in it, to look at, the next one last
+    std::set<file_id> searched = {};        // folders entered in it, and it
+    size_t found = 0;                       // audio files in it
+    size_t skipped = 0;                     // other files in it
     size_t existing = 0;                    // inputs left out by --skip-existing
     std::unordered_map<std::string, file_id> targets = {};  // marker files and their inputs
     std::string notes = {};                                 // lines for standard error

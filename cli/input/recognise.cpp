@@ -1,22 +1,39 @@
 #include "cli/input/recognise.h"
 
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
 #include <cstdint>
 
 #include "cli/input/file_bytes.h"
 
 namespace {
 
-bool has(const std::string &head, size_t at, const char *text, size_t size) {
-    return head.compare(at, size, text, size) == 0;
-}
+using namespace std::string_view_literals;
+
+struct signature {
+    file_kind kind;
+    std::string_view start;
+    size_t offset = 0;  // of middle
+    std::string_view middle = {};
+};
+constexpr signature kSignatures[] = {
+    {file_kind::wav, "RIFF", 8, "WAVE"},
+    {file_kind::aiff, "FORM", 8, "AIF"},
+    {file_kind::flac, "fLaC"},
+    {file_kind::ogg, "OggS\0"sv},
+    {file_kind::mp4, "", 4, "ftyp"},
+    {file_kind::mp4, "", 4, "moov"},
+    {file_kind::mp4, "", 4, "mdat"},
+    {file_kind::aac, "ADIF"},
+    {file_kind::asf, "\x30\x26\xB2\x75\x8E\x66\xCF\x11"},
+    {file_kind::matroska, "\x1A\x45\xDF\xA3"},
+};
+
+// In the order of file_kind.
+constexpr const char *kNames[] = {
+    "unknown",         "WAV", "AIFF", "FLAC", "Ogg", "MP4", "AAC", "MP3", "ASF (Windows Media)",
+    "Matroska or WebM"};
 
 // An MPEG audio or ADTS frame header. A byte order mark of UTF-16 is not taken for one.
-file_kind recognise_frame(const std::string &head) {
+file_kind recognise_frame(std::string_view head) {
     const auto byte = [&](size_t i) { return static_cast<uint8_t>(head[i]); };
     const bool has_sync = byte(0) == 0xFF && (byte(1) & 0xE0) == 0xE0 && byte(1) != 0xFE;
     if (!has_sync) return file_kind::unknown;
@@ -28,55 +45,26 @@ file_kind recognise_frame(const std::string &head) {
 
 }  // namespace
 
-file_kind recognise_bytes(const std::string &head) {
+file_kind recognise_bytes(std::string_view head) {
     if (head.size() < kKindBytes) return file_kind::unknown;
-    if (has(head, 0, "RIFF", 4) && has(head, 8, "WAVE", 4)) return file_kind::wav;
-    if (has(head, 0, "FORM", 4) && has(head, 8, "AIF", 3)) return file_kind::aiff;
-    if (has(head, 0, "fLaC", 4)) return file_kind::flac;
-    if (has(head, 0, "OggS\0", 5)) return file_kind::ogg;
-    for (const char *box : {"ftyp", "moov", "mdat"}) {
-        if (has(head, 4, box, 4)) return file_kind::mp4;
+    for (const signature &entry : kSignatures) {
+        const bool is_match = head.substr(0, entry.start.size()) == entry.start &&
+                              head.substr(entry.offset, entry.middle.size()) == entry.middle;
+        if (is_match) return entry.kind;
     }
-    if (has(head, 0, "ADIF", 4)) return file_kind::aac;
-    if (has(head, 0, "\x30\x26\xB2\x75\x8E\x66\xCF\x11", 8)) return file_kind::asf;
-    if (has(head, 0, "\x1A\x45\xDF\xA3", 4)) return file_kind::matroska;
-    if (has(head, 0, "ID3", 3) && static_cast<uint8_t>(head[3]) < 0x10) return file_kind::mpeg;
+    if (head.substr(0, 3) == "ID3" && static_cast<uint8_t>(head[3]) < 0x10) return file_kind::mpeg;
     return recognise_frame(head);
 }
 
 int recognise(const std::string &path, file_kind &kind) {
-    kind = file_kind::unknown;
-    file_bytes file;
-    if (!open_bytes(file, path)) return errno;
-    const int64_t start = id3v2_end(file);
-    kind = recognise_bytes(read_bytes(file, start, kKindBytes));
+    int code = 0;
+    const int64_t start = find_id3v2_end(path, code);
+    kind =
+        code == 0 ? recognise_bytes(read_bytes(path, start, kKindBytes, code)) : file_kind::unknown;
     if (kind == file_kind::unknown && start > 0) kind = file_kind::mpeg;
-    close_bytes(file);
-    return file.error;
+    return code;
 }
 
 const char *kind_name(file_kind kind) {
-    switch (kind) {
-        case file_kind::unknown:
-            break;
-        case file_kind::wav:
-            return "WAV";
-        case file_kind::aiff:
-            return "AIFF";
-        case file_kind::flac:
-            return "FLAC";
-        case file_kind::ogg:
-            return "Ogg";
-        case file_kind::mp4:
-            return "MP4";
-        case file_kind::aac:
-            return "AAC";
-        case file_kind::mpeg:
-            return "MP3";
-        case file_kind::asf:
-            return "ASF (Windows Media)";
-        case file_kind::matroska:
-            return "Matroska or WebM";
-    }
-    return "unknown";
+    return kNames[static_cast<size_t>(kind)];
 }

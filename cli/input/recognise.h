@@ -1,9 +1,10 @@
-// What a file contains, by its first bytes rather than by its name. The library decides what can be
-// analysed; this distinguishes audio from other files without opening it, and names it for people.
+// Recognises audio by a file's first bytes rather than by its name, and names its format for
+// people. The library decides what can be analysed.
 #ifndef TAVO_CLI_INPUT_RECOGNISE_H
 #define TAVO_CLI_INPUT_RECOGNISE_H
 
 #include <string>
+#include <string_view>
 
 enum class file_kind {
     unknown,
@@ -21,7 +22,7 @@ enum class file_kind {
 constexpr size_t kKindBytes = 16;  // that recognise_bytes looks at
 
 // head: the first bytes of a file, or those after its ID3v2 tag.
-file_kind recognise_bytes(const std::string &head);
+file_kind recognise_bytes(std::string_view head);
 
 // Returns 0, or errno when the file cannot be opened or read. Anything but a regular file is
 // unknown. Never blocks.

@@ -1,62 +1,63 @@
 #include "cli/input/shard.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cstdlib>
+#include <optional>
+#include <string_view>
 
 namespace {
 
-bool read_number(const char *begin, const char *end, int64_t &number) {
-    const auto [stop, error] = std::from_chars(begin, end, number);
-    return error == std::errc() && stop == end;
+using number = std::optional<int64_t>;
+
+number read_number(std::string_view text) {
+    int64_t value = 0;
+    const char *end = text.data() + text.size();
+    const auto [stop, error] = std::from_chars(text.data(), end, value);
+    return error == std::errc() && stop == end ? number(value) : std::nullopt;
 }
 
-bool read_environment(const char *name, int64_t &number) {
+number read_environment(const char *name) {
     const char *text = getenv(name);
-    return text != nullptr &&
-           read_number(text, text + std::char_traits<char>::length(text), number);
+    return text == nullptr ? std::nullopt : read_number(text);
 }
 
-// Task numbers of a Slurm array begin anywhere and go in steps.
-bool read_slurm(shard &out) {
-    int64_t first = 0;
-    int64_t step = 1;
-    if (!read_environment("SLURM_ARRAY_TASK_ID", out.index)) return false;
-    read_environment("SLURM_ARRAY_TASK_MIN", first);
-    read_environment("SLURM_ARRAY_TASK_STEP", step);
-    out.index = step > 0 ? (out.index - first) / step : -1;
-    return read_environment("SLURM_ARRAY_TASK_COUNT", out.count);
-}
-
-bool read_engine(shard &out) {
-    if (read_slurm(out)) return true;
-    if (read_environment("AWS_BATCH_JOB_ARRAY_INDEX", out.index)) {
-        if (read_environment("AWS_BATCH_JOB_ARRAY_SIZE", out.count)) return true;
-    } else if (!read_environment("JOB_COMPLETION_INDEX", out.index)) {
-        return false;
+void read_engine(number &index, number &count) {
+    if ((index = read_environment("SLURM_ARRAY_TASK_ID"))) {
+        // Task numbers of a Slurm array begin anywhere and go in steps.
+        const int64_t first = read_environment("SLURM_ARRAY_TASK_MIN").value_or(0);
+        const int64_t step = read_environment("SLURM_ARRAY_TASK_STEP").value_or(1);
+        index = step > 0 ? (*index - first) / step : -1;
+        count = read_environment("SLURM_ARRAY_TASK_COUNT");
+    } else if ((index = read_environment("AWS_BATCH_JOB_ARRAY_INDEX"))) {
+        count = read_environment("AWS_BATCH_JOB_ARRAY_SIZE");
+    } else {
+        index = read_environment("JOB_COMPLETION_INDEX");
     }
-    return read_environment("TAVO_SHARDS", out.count);
+    if (!count) count = read_environment("TAVO_SHARDS");
 }
 
 }  // namespace
 
 failure read_shard(const std::string &words, shard &out) {
+    number index;
+    number count;
     if (words == "auto") {
-        if (!read_engine(out)) {
+        read_engine(index, count);
+        if (!index || !count) {
             return {
                 "--shard auto finds no array in the environment (Slurm, Kubernetes with "
                 "TAVO_SHARDS, AWS Batch)."};
         }
     } else {
-        const size_t slash = words.find('/');
-        const char *text = words.data();
-        if (slash == std::string::npos || !read_number(text, text + slash, out.index) ||
-            !read_number(text + slash + 1, text + words.size(), out.count)) {
-            return {"--shard takes I/N, as in 3/10, or auto."};
-        }
-        --out.index;
+        const size_t slash = std::min(words.find('/'), words.size());
+        index = read_number(words.substr(0, slash));
+        if (slash < words.size()) count = read_number(words.substr(slash + 1));
+        if (!index || !count) return {"--shard takes I/N, as in 3/10, or auto."};
+        --*index;
     }
-    const bool inside = out.count >= 1 && out.index >= 0 && out.index < out.count;
-    if (inside) return {};
+    out = {*index, *count};
+    if (out.index >= 0 && out.index < out.count) return {};
     return {"--shard: the share must be from 1 to the number of shares."};
 }
 

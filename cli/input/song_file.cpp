@@ -9,12 +9,13 @@
 #include <array>
 #include <cerrno>
 #include <charconv>
-#include <cstring>
+#include <string_view>
 
 #include "cli/input/explain.h"
 #include "cli/input/ffmpeg.h"
 #include "cli/input/recognise.h"
 #include "cli/input/short_path.h"
+#include "cli/system.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
 
@@ -24,13 +25,12 @@ constexpr off_t kMostPipeBytes = off_t{4} << 30;  // memory for what comes throu
 
 // The descriptor that a path of the system names, -1 if it names none.
 int named_descriptor(const std::string &path) {
+    int fd = -1;
     if (path == "/dev/stdin") return STDIN_FILENO;
-    for (const char *folder : {"/dev/fd/", "/proc/self/fd/"}) {
-        const size_t size = strlen(folder);
-        int fd = -1;
-        if (path.compare(0, size, folder) != 0) continue;
+    for (const std::string_view folder : {"/dev/fd/", "/proc/self/fd/"}) {
         const char *end = path.data() + path.size();
-        if (std::from_chars(path.data() + size, end, fd).ptr == end) return fd;
+        if (path.compare(0, folder.size(), folder) != 0) continue;
+        if (std::from_chars(path.data() + folder.size(), end, fd).ptr == end) return fd;
     }
     return -1;
 }
@@ -43,38 +43,35 @@ bool is_inherited_pipe(int fd) {
 }
 
 // Copies a pipe to its end. Returns 0 or errno; ECANCELED after a stop.
-int copy_pipe(int from, int to, int stop_fd) {
+int copy_pipe(int source, int target, int stop_fd) {
     std::array<char, 65536> part;
     for (off_t bytes = 0; bytes <= kMostPipeBytes;) {
-        std::array<pollfd, 2> watched = {{{from, POLLIN, 0}, {stop_fd, POLLIN, 0}}};
+        std::array<pollfd, 2> watched = {{{source, POLLIN, 0}, {stop_fd, POLLIN, 0}}};
         if (poll(watched.data(), watched.size(), -1) < 0) continue;  // EINTR
         if (watched[1].revents != 0) return ECANCELED;
-        const ssize_t got = read(from, part.data(), part.size());
+        const ssize_t got = read(source, part.data(), part.size());
         if (got == 0) return 0;
         if (got < 0 && errno != EINTR && errno != EAGAIN) return errno;
-        for (ssize_t done = 0; done < got;) {
-            const ssize_t written = write(to, part.data() + done, static_cast<size_t>(got - done));
-            if (written < 0 && errno != EINTR) return errno;
-            if (written > 0) done += written;
-        }
-        if (got > 0) bytes += got;
+        if (got < 0) continue;
+        const int code = write_all(target, {part.data(), static_cast<size_t>(got)});
+        if (code != 0) return code;
+        bytes += got;
     }
     return EFBIG;
 }
 
-failure read_inherited_pipe(int from, int stop_fd, song_file &song) {
-    const int fd = memfd_create("song", MFD_CLOEXEC);
-    int code = fd < 0 ? errno : copy_pipe(from, fd, stop_fd);
-    struct stat info {};
-    if (code == 0 && fstat(fd, &info) != 0) code = errno;
-    if (code == 0 && info.st_size >= TAVO_MIN_FILE_BYTES) {
+failure read_inherited_pipe(int pipe_fd, int stop_fd, song_file &song) {
+    int fd = memfd_create("song", MFD_CLOEXEC);
+    const int code = fd < 0 ? errno : copy_pipe(pipe_fd, fd, stop_fd);
+    const off_t size = lseek(fd, 0, SEEK_CUR);
+    if (code == 0 && size >= TAVO_MIN_FILE_BYTES) {
         song = {"/proc/self/fd/" + std::to_string(fd), fd, fd, false};
         return {};
     }
-    if (fd >= 0) close(fd);
+    close_fd(fd);
     if (code == ECANCELED) return {"The analysis was stopped."};
     if (code != 0) return {system_sentence("The pipe cannot be read into memory", code)};
-    return {"Only " + std::to_string(info.st_size) + " bytes came through the pipe."};
+    return {"Only " + std::to_string(size) + " bytes came through the pipe."};
 }
 
 }  // namespace
@@ -99,10 +96,8 @@ failure decode_song(const std::string &path, const options &opts, int stop_fd, s
         return {"ffmpeg, which may read it, is not installed or is switched off."};
     }
     int sound_fd = -1;
-    const ffmpeg_limits limits = {opts.ffmpeg, opts.max_minutes, ""};
-    if (failure failed = decode_with_ffmpeg(limits, path, song.fd, stop_fd, sound_fd)) {
-        return failed;
-    }
+    const failure failed = decode_with_ffmpeg(opts, path, song.fd, "", stop_fd, sound_fd);
+    if (failed) return failed;
     song = {"/proc/self/fd/" + std::to_string(sound_fd), sound_fd, song.fd, true};
     return {};
 }
@@ -117,15 +112,15 @@ failure raise_song(const std::string &path, const options &opts, int stop_fd, co
     filter += ",volume=" + std::to_string(gain) + ":precision=double";
     if (offset_ms > 0.0) filter += ",adelay=" + std::to_string(offset_ms) + ":all=1";
     if (offset_ms < 0.0) filter += ",atrim=start=" + std::to_string(-offset_ms / 1000.0);
-    const ffmpeg_limits limits = {opts.ffmpeg, opts.max_minutes, filter};
     int fd = song.by_ffmpeg ? song.source_fd : song.fd;
-    if (failure failed = decode_with_ffmpeg(limits, path, fd, stop_fd, fd)) return failed;
+    const failure failed = decode_with_ffmpeg(opts, path, fd, filter, stop_fd, fd);
+    if (failed) return failed;
     raised = {"/proc/self/fd/" + std::to_string(fd), fd, -1, true};
     return {};
 }
 
 void close_song(song_file &song) {
-    if (song.fd >= 0) close(song.fd);
-    if (song.source_fd >= 0 && song.source_fd != song.fd) close(song.source_fd);
-    song.fd = song.source_fd = -1;
+    if (song.source_fd == song.fd) song.source_fd = -1;
+    close_fd(song.fd);
+    close_fd(song.source_fd);
 }

@@ -11,8 +11,8 @@
 #include <cmath>
 
 #include "cli/input/explain.h"
-#include "cli/input/ffmpeg_process.h"
 #include "cli/input/player_offset.h"
+#include "cli/system.h"
 #include "cli/write/click.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
@@ -137,7 +137,7 @@ void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record
         if (!failed) failed = {found.error};
     }
     if (failed) {
-        out.status = is_stop_requested(stop_fd) ? outcome::stopped : outcome::failed;
+        out.status = is_readable(stop_fd) ? outcome::stopped : outcome::failed;
         out.error = "The song could not be raised in level. " + failed.sentence;
         return;
     }
@@ -169,7 +169,7 @@ void analyse_opened(const options &opts, int stop_fd, song_file &song, record &o
     }
     out.error = explain_refusal(song.path, code, out).sentence;
     if (failed) out.error += " " + failed.sentence;
-    if (is_stop_requested(stop_fd)) out.status = outcome::stopped;
+    if (is_readable(stop_fd)) out.status = outcome::stopped;
 }
 
 // Processor time of this process, all threads, and of its ffmpeg processes, user and system.
@@ -191,7 +191,7 @@ record analyse(const std::string &path, const options &opts, int stop_fd, song_f
     record out = failed_record(path, opts.mode, open_song(path, stop_fd, song).sentence);
     out.length_s = opts.length_s;
     if (!out.error.empty()) {
-        if (is_stop_requested(stop_fd)) out.status = outcome::stopped;
+        if (is_readable(stop_fd)) out.status = outcome::stopped;
         return out;
     }
 

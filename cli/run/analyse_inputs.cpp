@@ -3,7 +3,6 @@
 #include <poll.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <deque>
 #include <vector>
 
@@ -22,13 +21,13 @@ constexpr size_t kMostWaiting = 1'000;  // results that wait for an earlier one
 
 struct run_state {
     const options &opts;
-    input_supply supply;
+    input_supply supply{opts};
+    process_pool pool{opts};
     supply_state found = supply_state::ready;  // by the last search
     std::deque<job> queue = {};
     size_t count = 0;  // inputs found so far
     ordered_output output = {};
     store db = {};
-    process_pool pool;
     bool is_ending = false;  // no more jobs are sent
     bool has_error = false;  // one that concerns no single file
 };
@@ -42,40 +41,29 @@ bool report(run_state &state, const failure &failed) {
 }
 
 void accept_result(run_state &state, job &&done, reply &&answer) {
-    const size_t index = done.message.index;
     if (done.message.stored.empty()) {
         report(state,
                add_song(state.db, {done.message.path, done.file, std::move(answer.json), {}}));
     }
-    accept_reply(state.output, index, std::move(answer));
-}
-
-void fail_input(run_state &state, job &&failed, const std::string &error) {
-    const record result = failed_record(failed.message.path, state.opts.mode, error);
-    accept_result(state, std::move(failed), make_reply(result, state.opts));
-}
-
-bool may_search(const run_state &state) {
-    return !state.is_ending && state.found != supply_state::ended &&
-           state.queue.size() < kMostAhead;
+    accept_reply(state.output, done.message.index, std::move(answer));
 }
 
 // Finds the next input of the command line or of the store.
 supply_state find_next(run_state &state, job &next) {
-    if (state.opts.from_store) {
-        stored_song song;
-        bool found = false;
-        report(state, read_next(state.db, song, found));
-        next.message.path = song.path;
-        next.message.stored = song.result;
-        next.refusal = song.damage;
-        return found ? supply_state::ready : supply_state::ended;
+    if (!state.opts.from_store) {
+        input entry;
+        const supply_state found = next_input(state.supply, entry);
+        next.message.path = std::move(entry.path);
+        next.refusal = std::move(entry.refusal);
+        return found;
     }
-    input entry;
-    const supply_state found = next_input(state.supply, entry);
-    next.message.path = std::move(entry.path);
-    next.refusal = std::move(entry.refusal);
-    return found;
+    stored_song song;
+    bool found = false;
+    report(state, read_next(state.db, song, found));
+    next.message.path = song.path;
+    next.message.stored = song.result;
+    next.refusal = song.damage;
+    return found ? supply_state::ready : supply_state::ended;
 }
 
 // True if the input belongs to this command's share and is not stored yet.
@@ -87,12 +75,17 @@ bool is_wanted(run_state &state, job &next) {
     return is_new;
 }
 
+bool may_search(const run_state &state) {
+    return !state.is_ending && state.found != supply_state::ended &&
+           state.queue.size() < kMostAhead;
+}
+
 // Finds a few more inputs, unless enough are queued.
 void search_inputs(run_state &state) {
     for (size_t i = 0; i < kFoundAtOnce && may_search(state); ++i) {
         job next;
         state.found = find_next(state, next);
-        if (state.found == supply_state::ended) set_total(state.output, state.count);
+        if (state.found == supply_state::ended) state.output.total = state.count;
         if (state.found != supply_state::ready) break;
         if (!is_wanted(state, next)) continue;
         next.message.index = state.count++;
@@ -113,17 +106,19 @@ void send_jobs(run_state &state) {
         job next = std::move(first);
         state.queue.pop_front();
         if (failed) {
-            fail_input(state, std::move(next), failed.sentence);
+            const record result =
+                failed_record(next.message.path, state.opts.mode, failed.sentence);
+            accept_result(state, std::move(next), make_reply(result, state.opts));
         } else {
             send_job(state.pool, *worker, std::move(next));
         }
     }
 }
 
-// The shortest of several times for poll, where -1 is forever.
-int shortest_wait(std::initializer_list<int> waits) {
-    int shortest = -1;
-    for (const int wait : waits) {
+// How long poll may wait: the shortest of the times of which each may be -1, which is forever.
+int wait_ms(const run_state &state) {
+    int shortest = state.output.bar.shown ? kRedrawMs : -1;
+    for (const int wait : {batch_timeout_ms(state.db), deadline_timeout_ms(state.pool)}) {
         if (wait >= 0 && (shortest < 0 || wait < shortest)) shortest = wait;
     }
     return shortest;
@@ -134,22 +129,18 @@ int shortest_wait(std::initializer_list<int> waits) {
 void wait_and_serve(run_state &state) {
     const bool is_listening = may_search(state) && state.found == supply_state::waiting;
     const bool is_searching = may_search(state) && !is_listening;
-    std::vector<pollfd> watched;
-    watched.push_back({state.is_ending ? -1 : stop_fd(), POLLIN, 0});
-    watched.push_back({state.output.to_pipe && !state.is_ending ? STDOUT_FILENO : -1, 0, 0});
-    watched.push_back({is_listening ? supply_fd(state.supply) : -1, POLLIN, 0});
+    std::vector<pollfd> watched = {
+        {state.is_ending ? -1 : stop_fd(), POLLIN, 0},
+        {state.output.to_pipe && !state.is_ending ? STDOUT_FILENO : -1, 0, 0},
+        {is_listening ? supply_fd(state.supply) : -1, POLLIN, 0}};
     const size_t first_worker = watched.size();
     append_watched(state.pool, watched);
-    const int timeout =
-        is_searching ? 0
-                     : shortest_wait({redraw_timeout_ms(state.output), batch_timeout_ms(state.db),
-                                      deadline_timeout_ms(state.pool)});
-    if (poll(watched.data(), watched.size(), timeout) >= 0) {
-        if ((watched[1].revents & POLLERR) != 0) note_reader_gone(state.output);
+    if (poll(watched.data(), watched.size(), is_searching ? 0 : wait_ms(state)) >= 0) {
+        if ((watched[1].revents & POLLERR) != 0) state.output.reader_gone = true;
         serve_workers(state.pool, watched.data() + first_worker);
     }
     report(state, commit_old_batch(state.db));
-    redraw(state.output);
+    draw_progress(state.output.bar, state.output.done, state.output.total);
 }
 
 // Ends the workers once nothing is left to do, or at a stop.
@@ -165,13 +156,11 @@ void end_if_done(run_state &state) {
 }  // namespace
 
 int analyse_inputs(const options &opts) {
-    run_state state{opts, {opts}, supply_state::ready, {}, 0, {}, {}, {opts, {}, {}}};
+    run_state state{opts};
     state.pool.on_reply = [&](job &&done, reply &&answer) {
         accept_result(state, std::move(done), std::move(answer));
     };
-    state.pool.on_bad_end = [&](const std::string &ending) {
-        report(state, {"an analysis process without a file was ended " + ending + "."});
-    };
+    state.pool.on_bad_end = [&](const failure &failed) { report(state, failed); };
     if (report(state, open_store(state.db, opts))) return kExitFailed;
     if (report(state, start_output(state.output, opts))) return kExitFailed;
     while (true) {

@@ -1,82 +1,60 @@
 #include "cli/run/messages.h"
 
-#include <unistd.h>
-
-#include <array>
-#include <cerrno>
 #include <cstring>
+#include <initializer_list>
+#include <string_view>
 
 namespace {
 
-// A message is a head and the texts, one after the other.
-
-template <size_t kTexts>
-struct message_head {
-    uint64_t number;
-    uint64_t text_bytes[kTexts];
-};
-
-template <size_t kTexts>
-std::string join(uint64_t number, const std::array<const std::string *, kTexts> &texts) {
-    message_head<kTexts> head = {number, {}};
-    size_t size = sizeof head;
-    for (size_t i = 0; i < kTexts; ++i) size += head.text_bytes[i] = texts[i]->size();
-    std::string out;
-    out.reserve(size);
-    out.append(reinterpret_cast<const char *>(&head), sizeof head);
-    for (const std::string *text : texts) out += *text;
-    return out;
+// A message consists of texts, each after its size.
+std::string join(std::initializer_list<std::string_view> texts) {
+    std::string message;
+    for (const std::string_view text : texts) {
+        const size_t size = text.size();
+        message.append(reinterpret_cast<const char *>(&size), sizeof size).append(text);
+    }
+    return message;
 }
 
-template <size_t kTexts>
-bool split(std::string &received, uint64_t &number,
-           const std::array<std::string *, kTexts> &texts) {
-    message_head<kTexts> head{};
-    if (received.size() < sizeof head) return false;
-    memcpy(&head, received.data(), sizeof head);
-    size_t size = sizeof head;
-    for (const uint64_t bytes : head.text_bytes) size += bytes;
-    if (received.size() < size) return false;
-    number = head.number;
-    size_t at = sizeof head;
-    for (size_t i = 0; i < kTexts; ++i) {
-        *texts[i] = received.substr(at, head.text_bytes[i]);
-        at += head.text_bytes[i];
+bool split(std::string &received, std::initializer_list<std::string *> texts) {
+    size_t end = 0;
+    for (std::string *text : texts) {
+        size_t size = 0;
+        if (received.size() - end < sizeof size) return false;
+        memcpy(&size, received.data() + end, sizeof size);
+        end += sizeof size;
+        if (received.size() - end < size) return false;
+        text->assign(received, end, size);
+        end += size;
     }
-    received.erase(0, size);
+    received.erase(0, end);
     return true;
 }
 
 }  // namespace
 
-const std::string kEmptyReply = encode(reply());
-
 std::string encode(const request &message) {
-    return join<2>(message.index, {&message.path, &message.stored});
+    return join({std::to_string(message.index), message.path, message.stored});
 }
 
 std::string encode(const reply &message) {
-    return join<4>(static_cast<uint64_t>(message.status),
-                   {&message.result, &message.message, &message.json, &message.row});
+    const std::string status = std::to_string(static_cast<int>(message.status));
+    return join({status, message.result, message.message, message.json, message.row});
 }
 
 bool decode(std::string &received, request &message) {
-    return split<2>(received, message.index, {&message.path, &message.stored});
+    std::string index;
+    if (!split(received, {&index, &message.path, &message.stored})) return false;
+    message.index = std::stoull(index);
+    return true;
 }
 
 bool decode(std::string &received, reply &message) {
-    uint64_t status = 0;
-    const bool is_whole = split<4>(
-        received, status, {&message.result, &message.message, &message.json, &message.row});
-    if (is_whole) message.status = static_cast<outcome>(status);
-    return is_whole;
-}
-
-int write_all(int fd, const char *data, size_t size) {
-    for (size_t done = 0; done < size;) {
-        const ssize_t got = write(fd, data + done, size - done);
-        if (got < 0 && errno != EINTR) return errno;
-        if (got > 0) done += static_cast<size_t>(got);
+    std::string status;
+    if (!split(received,
+               {&status, &message.result, &message.message, &message.json, &message.row})) {
+        return false;
     }
-    return 0;
+    message.status = static_cast<outcome>(std::stoi(status));
+    return true;
 }

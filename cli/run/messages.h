@@ -1,5 +1,4 @@
-// The messages between the command and a worker process: a request through one pipe, its reply
-// through another. A worker has at most one request at a time.
+// The messages between the command and a worker process. A worker has one request at a time.
 #ifndef TAVO_CLI_RUN_MESSAGES_H
 #define TAVO_CLI_RUN_MESSAGES_H
 
@@ -19,7 +18,7 @@ struct reply {
     std::string result;   // for standard output
     std::string message;  // for standard error
     std::string json;     // the result for the store, if it belongs there
-    std::string row;      // of the report's index, if there is one
+    std::string row;      // of the report's index, if it has one
 };
 
 std::string encode(const request &message);
@@ -28,11 +27,5 @@ std::string encode(const reply &message);
 // Decodes the message at the start of received and removes it. False if it is not complete yet.
 bool decode(std::string &received, request &message);
 bool decode(std::string &received, reply &message);
-
-// The reply sent when there is not enough memory for another: failed, without texts.
-extern const std::string kEmptyReply;
-
-// Writes all bytes and repeats interrupted calls. Returns 0 or errno.
-int write_all(int fd, const char *data, size_t size);
 
 #endif

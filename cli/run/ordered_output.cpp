@@ -7,6 +7,7 @@
 #include <csignal>
 
 #include "cli/run/stop.h"
+#include "cli/system.h"
 #include "cli/write/format.h"
 #include "cli/write/value_text.h"
 
@@ -15,12 +16,9 @@ namespace {
 void write_result(ordered_output &output, const std::string &text) {
     if (text.empty() || output_failed(output)) return;
     clear_progress(output.bar);
-    const int code = write_all(STDOUT_FILENO, text.data(), text.size());
-    if (code == EPIPE) {
-        output.reader_gone = true;
-    } else if (code != 0) {
-        output.write_error = code;
-    }
+    const int code = write_all(STDOUT_FILENO, text);
+    output.reader_gone = code == EPIPE;
+    if (code != EPIPE) output.write_error = code;
 }
 
 // A part of the index could not be written.
@@ -41,18 +39,12 @@ void write_reply(ordered_output &output, const reply &answer) {
 }  // namespace
 
 failure start_output(ordered_output &output, const options &opts) {
-    failure failed = {begin_report_index(output.index, opts)};
-    if (failed) return failed;
+    if (failure failed = {begin_report_index(output.index, opts)}) return failed;
     struct stat info {};
     output.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
     output.bar = start_progress(opts.quiet);
     write_result(output, format_head(opts.format));
     return {};
-}
-
-void set_total(ordered_output &output, size_t total) {
-    output.total = total;
-    output.bar.total = total;
 }
 
 void accept_reply(ordered_output &output, size_t index, reply &&answer) {
@@ -69,23 +61,11 @@ void accept_reply(ordered_output &output, size_t index, reply &&answer) {
 void write_message(ordered_output &output, const std::string &text) {
     if (text.empty()) return;
     clear_progress(output.bar);
-    write_all(STDERR_FILENO, text.data(), text.size());
-}
-
-void note_reader_gone(ordered_output &output) {
-    output.reader_gone = true;
+    write_all(STDERR_FILENO, text);
 }
 
 bool output_failed(const ordered_output &output) {
     return output.reader_gone || output.write_error != 0;
-}
-
-int redraw_timeout_ms(const ordered_output &output) {
-    return output.bar.shown ? kRedrawMs : -1;
-}
-
-void redraw(ordered_output &output) {
-    draw_progress(output.bar, output.done);
 }
 
 int finish_output(ordered_output &output, const options &opts, bool has_other_error) {
@@ -97,10 +77,9 @@ int finish_output(ordered_output &output, const options &opts, bool has_other_er
             "tavo: " + system_sentence("The results cannot be written", output.write_error) + "\n");
     }
     if (stop_signal() != 0) {
-        const std::string done = output.total == 0 ? count_text(output.done, "file")
-                                                   : std::to_string(output.done) + " of " +
-                                                         count_text(output.total, "file");
-        write_message(output, "tavo: stopped; " + done + " done.\n");
+        const std::string total = output.total == 0 ? "" : std::to_string(output.done) + " of ";
+        const size_t counted = output.total == 0 ? output.done : output.total;
+        write_message(output, "tavo: stopped; " + total + count_text(counted, "file") + " done.\n");
         return kExitSignal + stop_signal();
     }
     if (output.reader_gone) return kExitSignal + SIGPIPE;

@@ -29,14 +29,9 @@ struct ordered_output {
 
 // Fails if the report's index cannot be begun.
 failure start_output(ordered_output &output, const options &opts);
-void set_total(ordered_output &output, size_t total);  // once all inputs are known
 void accept_reply(ordered_output &output, size_t index, reply &&answer);
 void write_message(ordered_output &output, const std::string &text);
-void note_reader_gone(ordered_output &output);
 bool output_failed(const ordered_output &output);
-
-int redraw_timeout_ms(const ordered_output &output);  // for poll: -1 without a progress line
-void redraw(ordered_output &output);
 
 // Call it after the last reply. Finishes the report's index and reports errors of the output and a
 // stop. Returns the exit status; has_other_error: something other than a file failed.

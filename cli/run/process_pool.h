@@ -1,8 +1,9 @@
 // Starts, feeds, stops and reaps the worker processes. The library allows one instance per process:
 // with workers several files are analysed at once, and a crash costs one file.
 //
-// Closing a request pipe stops the analysis and the worker; the reply pipe ends with the worker.
-// The command is single-threaded, so that it can fork at any moment.
+// The command and a worker talk through a pair of sockets. The command's end of writing stops the
+// analysis and the worker; the worker's end shows as the end of its replies. The command is
+// single-threaded, so that it can fork at any moment.
 #ifndef TAVO_CLI_RUN_PROCESS_POOL_H
 #define TAVO_CLI_RUN_PROCESS_POOL_H
 
@@ -27,24 +28,24 @@ struct job {
     file_state file;  // for the store
 };
 
+using time_point = std::chrono::steady_clock::time_point;
+
 struct worker_process {
-    pid_t pid = -1;
-    int request_fd = -1;  // -1 once the worker was asked to end
-    int reply_fd = -1;    // -1 once it has ended
+    pid_t pid = -1;  // -1 once it was reaped
+    int fd = -1;     // socket
     bool is_busy = false;
-    job current;           // while busy
-    std::string received;  // start of a reply
-    bool has_deadline = false;
-    std::chrono::steady_clock::time_point deadline;  // the worker is killed then
-    temporary_files *files = nullptr;                // shared with the worker
+    job current;                              // while busy
+    std::string received;                     // start of a reply
+    time_point deadline = time_point::max();  // the worker is killed then
+    temporary_files *files = nullptr;         // shared with the worker
 };
 
 struct process_pool {
     const options &opts;
     // Called with each job's reply, in any order.
-    std::function<void(job &&, reply &&)> on_reply;
+    std::function<void(job &&, reply &&)> on_reply = {};
     // Called if a worker without a job ended badly.
-    std::function<void(const std::string &how)> on_bad_end;
+    std::function<void(const failure &)> on_bad_end = {};
     std::vector<worker_process> processes = {};
     bool is_stopping = false;
 };
@@ -58,7 +59,7 @@ void send_job(const process_pool &pool, worker_process &worker, job &&next);
 bool has_busy(const process_pool &pool);
 
 // Asks the workers to end. With is_stop they give up their jobs and are killed if they have not
-// ended after a second.
+// ended after a second. Call it once; no job may be sent afterwards.
 void end_workers(process_pool &pool, bool is_stop);
 
 // For poll: appends one entry for each worker, in their order.

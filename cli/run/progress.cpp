@@ -22,13 +22,13 @@ size_t terminal_columns() {
     return size.ws_col;
 }
 
-std::string numbers(const progress &bar, size_t done, double seconds) {
+std::string numbers(size_t done, size_t total, double seconds) {
     const double rate = static_cast<double>(done) / seconds;
     std::array<char, 48> speed{};
     snprintf(speed.data(), speed.size(), ", %.1f a minute", rate * 60.0);
-    if (bar.total == 0) return count_text(done, "file") + speed.data();
-    const double left_ms = 1000.0 * static_cast<double>(bar.total - done) / rate;
-    return " " + std::to_string(done) + "/" + std::to_string(bar.total) + " files" + speed.data() +
+    if (total == 0) return count_text(done, "file") + speed.data();
+    const double left_ms = 1000.0 * static_cast<double>(total - done) / rate;
+    return " " + std::to_string(done) + "/" + std::to_string(total) + " files" + speed.data() +
            (done == 0 ? ", time unknown" : ", " + whole_clock_text(left_ms) + " left");
 }
 
@@ -41,18 +41,18 @@ progress start_progress(bool quiet) {
     return bar;
 }
 
-void draw_progress(progress &bar, size_t done) {
-    if (!bar.shown || bar.total == 1) return;
+void draw_progress(progress &bar, size_t done, size_t total) {
+    if (!bar.shown || total == 1) return;
     const std::chrono::duration<double> run = std::chrono::steady_clock::now() - bar.started;
     if (run.count() < kFirstDrawSeconds) return;
 
-    const std::string tail = numbers(bar, done, run.count());
+    const std::string tail = numbers(done, total, run.count());
     const size_t columns = terminal_columns() - 1;  // the last one makes some terminals wrap
     const size_t room = columns > tail.size() + 2 ? columns - tail.size() - 2 : 0;
     const size_t width = std::min(room, kMostBarColumns);
     std::string line;
-    if (width > 0 && bar.total > 0) {
-        const size_t filled = width * done / bar.total;
+    if (width > 0 && total > 0) {
+        const size_t filled = width * done / total;
         line = "[" + std::string(filled, '#') + std::string(width - filled, '-') + "]";
     }
     line = (line + tail).substr(0, columns);

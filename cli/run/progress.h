@@ -8,16 +8,16 @@
 struct progress {
     bool shown = false;  // standard error is a terminal, and not --quiet
     bool drawn = false;  // the line is on the terminal
-    size_t total = 0;    // files; 0 while not all are known
     std::chrono::steady_clock::time_point started;
 };
 
-constexpr int kRedrawMs = 500;
+constexpr int kRedrawMs = 500;  // between two redraws
 
 progress start_progress(bool quiet);
 
-// Redraws the line once the work has taken a second, but not for a single file.
-void draw_progress(progress &bar, size_t done);
+// Redraws the line once the work has taken a second, but not for a single file. total: files; 0
+// while not all are known.
+void draw_progress(progress &bar, size_t done, size_t total);
 
 // Clears the line. Call it before writing anything else to the terminal.
 void clear_progress(progress &bar);

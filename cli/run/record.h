@@ -38,7 +38,7 @@ struct record {
     std::string decoder;     // "ffmpeg" if that program decoded the file, else empty
     std::string sound_path;  // what it decoded, while the song is open
 
-    int64_t cpu_ms = -1;  // processor time, all threads; -1 if there was no analysis
+    int64_t cpu_ms = -1;  // processor time, all threads; -1 without an analysis
 
     std::string written;  // the marker file, once it is written
 };

@@ -3,21 +3,10 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
-#include <climits>
 #include <csignal>
 #include <cstring>
 
 #include "cli/options.h"
-
-namespace {
-
-constexpr size_t kMostFiles = 4;  // a click track, a page, markers, a clip
-
-}  // namespace
-
-struct temporary_files {
-    char paths[kMostFiles][PATH_MAX];  // an empty one is free
-};
 
 namespace {
 

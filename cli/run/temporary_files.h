@@ -3,11 +3,14 @@
 #ifndef TAVO_CLI_RUN_TEMPORARY_FILES_H
 #define TAVO_CLI_RUN_TEMPORARY_FILES_H
 
+#include <climits>
 #include <string>
 
-struct temporary_files;
+struct temporary_files {
+    char paths[4][PATH_MAX];  // of a click track, a page, markers, a clip; an empty one is free
+};
 
-// Returns null if there is no memory.
+// Returns null if memory is short.
 temporary_files *make_temporary_files();
 void release_temporary_files(temporary_files *files);  // accepts null
 

@@ -4,16 +4,17 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
 #include <cstdlib>
 #include <exception>
 #include <fstream>
-#include <functional>
 #include <iterator>
 #include <nlohmann/json.hpp>
 
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
+#include "cli/system.h"
 #include "cli/write/clip.h"
 #include "cli/write/file_names.h"
 #include "cli/write/format.h"
@@ -52,77 +53,85 @@ bool is_stored(const options &opts) {
     return !opts.store.empty() && !opts.from_store;
 }
 
-// A file that is written besides the result. refusal: the target cannot be written, which is
-// checked before the analysis. write turns the record into a failed one if it fails.
-struct companion {
-    bool wanted;
-    std::string refusal;
-    std::function<void(record &)> write;
-};
-
 bool has_content(const std::string &path, const std::string &content) {
     std::ifstream file(path, std::ios::binary);
-    const std::string there((std::istreambuf_iterator<char>(file)),
-                            std::istreambuf_iterator<char>());
+    const std::string there((std::istreambuf_iterator<char>(file)), {});
     return file && there == content;
 }
 
 void write_markers(record &result, const options &opts, const std::string &target) {
     const std::string content = marker_content(result, opts);
-    // The file of a run that was killed before it committed the row.
-    if (is_stored(opts) && has_content(target, content)) {
-        result.written = target;
-        return;
-    }
-    const std::string error = write_file(target, content, opts.force);
-    if (error.empty()) {
-        result.written = target;
+    // A command that was killed before it committed the row has left the file.
+    const bool is_written = is_stored(opts) && has_content(target, content);
+    const failure failed = {is_written ? "" : write_file(target, content, opts.force)};
+    if (failed) {
+        result = failed_record(result.file, result.mode, failed.sentence);
     } else {
-        result = failed_record(result.file, result.mode, error);
+        result.written = target;
     }
 }
 
-companion markers_of(const request &message, const options &opts) {
-    if (!writes_files(opts.format)) return {};
-    const std::string target = marker_path(message.path, opts);
-    // With a store an existing file may be this song's: write_markers compares.
-    return {true, check_target(target, opts.force || is_stored(opts)),
-            [=](record &result) { write_markers(result, opts, target); }};
-}
+// The files that are written besides the result. A path is empty if the file was not asked for.
+struct side_files {
+    std::string page;
+    std::string markers;
+    std::string clip;
+};
 
-companion page_of(const request &message, const options &opts, int stop_fd, std::string &row) {
-    if (opts.report.empty()) return {};
-    const std::string target = report_page_path(opts, message.index, message.path);
-    return {true, check_report(target, opts.force),
-            [=, &row](record &result) { write_report_page(result, opts, target, stop_fd, row); }};
-}
-
-companion clip_of(const request &message, const options &opts, int stop_fd, const song_file &song) {
-    if (opts.clip.empty()) return {};
-    const std::string target = clip_path(message.path, opts);
-    return {true, check_target(target, opts.force),
-            [=, &opts, &song](record &result) { write_clip(result, opts, target, stop_fd, song); }};
-}
-
-// is_storable becomes false if only writing such a file failed: the store does not record that as a
-// failure of the song.
-record analyse_and_write(const request &message, const options &opts, int stop_fd, std::string &row,
-                         bool &is_storable) {
-    song_file song;
-    const companion companions[] = {page_of(message, opts, stop_fd, row), markers_of(message, opts),
-                                    clip_of(message, opts, stop_fd, song)};
-    for (const companion &each : companions) {
-        is_storable = each.refusal.empty();
-        if (!is_storable) return failed_record(message.path, opts.mode, each.refusal);
-    }
-    record out = find_result(message, opts, stop_fd, song);
-    const bool is_ok = out.status == outcome::ok;
-    for (const companion &each : companions) {
-        if (each.wanted && out.status == outcome::ok) each.write(out);
-    }
-    close_song(song);
-    is_storable = !is_ok || out.status == outcome::ok;
+side_files find_side_files(const request &message, const options &opts) {
+    side_files out;
+    if (!opts.report.empty()) out.page = report_page_path(opts, message.index, message.path);
+    if (writes_files(opts.format)) out.markers = marker_path(message.path, opts);
+    if (!opts.clip.empty()) out.clip = clip_path(message.path, opts);
     return out;
+}
+
+// Checks before the analysis that the files can be written.
+failure check_side_files(const side_files &files, const options &opts) {
+    failure failed;
+    if (!files.page.empty()) failed = {check_report(files.page, opts.force)};
+    // With a store an existing file may be this song's: write_markers compares.
+    const bool may_exist = opts.force || is_stored(opts);
+    if (!failed && !files.markers.empty()) failed = {check_target(files.markers, may_exist)};
+    if (!failed && !files.clip.empty()) failed = {check_target(files.clip, opts.force)};
+    return failed;
+}
+
+reply analyse_and_write(const request &message, const options &opts, int stop_fd) {
+    const side_files files = find_side_files(message, opts);
+    const failure refused = check_side_files(files, opts);
+    if (refused) {
+        reply out = make_reply(failed_record(message.path, opts.mode, refused.sentence), opts);
+        out.json.clear();
+        return out;
+    }
+    song_file song;
+    std::string row;
+    record result = find_result(message, opts, stop_fd, song);
+    const bool is_analysed = result.status == outcome::ok;
+    const auto is_ok = [&result] { return result.status == outcome::ok; };
+    if (is_ok() && !files.page.empty()) {
+        write_report_page(result, opts, files.page, stop_fd, row);
+    }
+    if (is_ok() && !files.markers.empty()) write_markers(result, opts, files.markers);
+    if (is_ok() && !files.clip.empty()) write_clip(result, opts, files.clip, stop_fd, song);
+    close_song(song);
+    reply out = make_reply(result, opts);
+    if (is_ok()) out.row = row;
+    // The store does not record that only a file could not be written.
+    if (is_analysed && !is_ok()) out.json.clear();
+    return out;
+}
+
+std::string serve(const request &message, const options &opts, int stop_fd) {
+    try {
+        return encode(analyse_and_write(message, opts, stop_fd));
+    } catch (const std::exception &) {  // only allocations can fail here
+        const char *error = "There is not enough memory for the result.";
+        reply out = make_reply(failed_record(message.path, opts.mode, error), opts);
+        out.json.clear();
+        return encode(out);
+    }
 }
 
 // Each job reuses the heap of the one before instead of asking the system for new pages. The heap
@@ -137,25 +146,6 @@ void prepare_heap() {
         free(block);
     }
     mallopt(M_MMAP_THRESHOLD, kLargestHeapBlock);
-}
-
-reply make_answer(const request &message, const options &opts, int stop_fd) {
-    std::string row;
-    bool is_storable = true;
-    const record result = analyse_and_write(message, opts, stop_fd, row, is_storable);
-    reply out = make_reply(result, opts);
-    if (!is_storable) out.json.clear();
-    if (result.status == outcome::ok) out.row = row;
-    return out;
-}
-
-// Returns the reply as it is sent.
-std::string encoded_answer(const request &message, const options &opts, int stop_fd) {
-    try {
-        return encode(make_answer(message, opts, stop_fd));
-    } catch (const std::exception &) {  // only allocations can fail here
-        return kEmptyReply;
-    }
 }
 
 }  // namespace
@@ -176,18 +166,17 @@ reply make_reply(const record &result, const options &opts) {
     return out;
 }
 
-int serve_requests(int request_fd, int reply_fd, const options &opts) {
+int serve_requests(int fd, const options &opts) {
     prepare_heap();
     std::string received;
-    char part[4096];
+    std::array<char, 4096> part;
     while (true) {
-        const ssize_t got = read(request_fd, part, sizeof part);
+        const ssize_t got = read(fd, part.data(), part.size());
         if (got < 0 && errno == EINTR) continue;
         if (got <= 0) return kExitOk;
-        received.append(part, static_cast<size_t>(got));
+        received.append(part.data(), static_cast<size_t>(got));
         request message;
         if (!decode(received, message)) continue;
-        const std::string answer_text = encoded_answer(message, opts, request_fd);
-        if (write_all(reply_fd, answer_text.data(), answer_text.size()) != 0) return kExitOk;
+        if (write_all(fd, serve(message, opts, fd)) != 0) return kExitOk;
     }
 }

@@ -8,7 +8,7 @@
 
 reply make_reply(const record &result, const options &opts);
 
-// Serves requests until their pipe ends. Returns the process's exit status.
-int serve_requests(int request_fd, int reply_fd, const options &opts);
+// Serves requests until the other end of the socket is closed. Returns the exit status.
+int serve_requests(int fd, const options &opts);
 
 #endif

@@ -10,9 +10,9 @@
 #include <ctime>
 #include <nlohmann/json.hpp>
 
-#include "cli/run/messages.h"
 #include "cli/run/stop.h"
 #include "cli/store/songs_table.h"
+#include "cli/system.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
@@ -244,7 +244,7 @@ failure close_store(store &db, std::string &summary) {
     if (db.kind == nullptr) return {};
     failure failed = commit_batch(db);
     for (const stored_song &song : db.batch) {
-        write_all(STDOUT_FILENO, song.result.data(), song.result.size());
+        write_all(STDOUT_FILENO, song.result);
     }
     if ((!db.opts.quiet && !db.opts.from_store) || !db.batch.empty()) summary = summary_text(db);
     disconnect(db);

@@ -8,6 +8,7 @@
 #include <cstdio>
 
 #include "cli/input/ffmpeg_process.h"
+#include "cli/system.h"
 #include "cli/write/file_names.h"
 #include "cli/write/output_file.h"
 
@@ -81,7 +82,7 @@ failure cut(const record &result, const options &opts, const std::string &target
     }
     const std::vector<std::string> words = clip_output(cut_filter(result, opts), file.temporary);
     failure failed = run_ffmpeg({opts.ffmpeg, result.file, song.source_fd, words}, stop_fd,
-                                [](const char *, size_t) { return failure(); });
+                                [](std::string_view) { return failure(); });
     if (failed) {
         const size_t named = failed.sentence.find(file.temporary);
         if (named != std::string::npos) {
@@ -106,6 +107,6 @@ void write_clip(record &result, const options &opts, const std::string &target, 
                 const song_file &song) {
     if (failure failed = cut(result, opts, target, stop_fd, song)) {
         result = failed_record(result.file, result.mode, failed.sentence);
-        if (is_stop_requested(stop_fd)) result.status = outcome::stopped;
+        if (is_readable(stop_fd)) result.status = outcome::stopped;
     }
 }

@@ -1,0 +1,35 @@
+#include "cli/system.h"
+
+#include <poll.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+void close_fd(int &fd) {
+    if (fd >= 0) close(fd);
+    fd = -1;
+}
+
+bool is_readable(int fd) {
+    pollfd watched = {fd, POLLIN, 0};
+    return poll(&watched, 1, 0) > 0;
+}
+
+int write_all(int fd, std::string_view bytes) {
+    while (!bytes.empty()) {
+        const ssize_t written = write(fd, bytes.data(), bytes.size());
+        if (written < 0 && errno != EINTR) return errno;
+        if (written > 0) bytes.remove_prefix(static_cast<size_t>(written));
+    }
+    return 0;
+}
+
+std::string ending_text(int status) {
+    if (WIFSIGNALED(status)) {
+        const int number = WTERMSIG(status);
+        return "by signal " + std::to_string(number) + " (" + strsignal(number) + ")";
+    }
+    return "with status " + std::to_string(WEXITSTATUS(status));
+}
