@@ -23,8 +23,8 @@ constexpr int32_t kTriedFrames = 64;  // frames tried until one decodes at all
 constexpr int32_t kMaxFrameSamples = 4096;  // as 16-bit pairs well within a source's frame buffer
 constexpr int32_t kMaxBlockBytes = 8191;    // what an ADTS header can state, beyond any real block
 
-// A decoder's noise generator carries history, so that each group of frames has a fresh one.
-// Opening it costs as much as decoding several frames, which favours large groups; a seek decodes
+// A decoder's noise generator carries history, so each group of frames has a fresh decoder.
+// Opening one costs as much as decoding several frames, which favours large groups; a seek decodes
 // half a group on average, which favours small ones.
 //
 // One frame suffices for the overlap of low complexity. Band replication has filters and envelopes

@@ -1,6 +1,6 @@
 // One stream of compressed frames, read as 16-bit PCM from any sample on: what AAC, MPEG audio, MP4
-// and Ogg have in common. Their readers are records of this type, and the functions that read,
-// seek and delete them are the same.
+// and Ogg have in common. stream.cpp defines the functions of the interface that read, seek and
+// delete, once for all of these readers.
 //
 // In: the frames that a format's scan finds. Out: PCM, frame by frame, for the copying decoders.
 #ifndef WEXAAUDIO_STREAM_H
@@ -19,7 +19,7 @@ struct stream_reader {
 };
 
 // Null when the file cannot be read as the format, when libavcodec is missing, and when out of
-// memory. *duration receives the stream's, in 100-ns units. The interface's functions do the rest.
+// memory. *duration receives the stream's, in 100-ns units. The interface's functions delete it.
 stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration);
 
 // Copies bytes at an offset of the frames' kind. Returns the bytes copied, fewer when the pages or
