@@ -1,13 +1,13 @@
-# cmake --install. The public header goes to include/tavo, the include folder that the CMake package and
-# tavo.pc name. All files find each other by relative paths.
+# cmake --install. The public header goes to include/tavo, which the CMake package and tavo.pc add to the include
+# path. All files find each other by relative paths.
 set(headers_dir ${CMAKE_INSTALL_INCLUDEDIR}/tavo)
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/tavo)
 install(FILES include/tavo.h DESTINATION ${headers_dir})
 install(TARGETS tavo EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}
   INCLUDES DESTINATION ${headers_dir})
 
-# A device has these two. On a desktop they are private: their names are too common for a folder that every
-# program searches, and Debian's android-liblog has another liblog.
+# A device has these two. On a desktop they are private, because their names are too common for a folder that every
+# program searches. Debian's android-liblog has another liblog.
 if(NOT ANDROID)
   install(TARGETS log wexaaudio EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)
   install(TARGETS wexaaudio_av DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)  # wexaaudio loads it
@@ -38,7 +38,7 @@ if(TARGET tavo_command)
   install(FILES packaging/tavo.fish DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d)
 endif()
 
-# The page, if it was built: cmake --preset web && cmake --build --preset web.
+# The page, if it has been built: cmake --preset web && cmake --build --preset web.
 install(FILES build/web/tavo.html DESTINATION ${CMAKE_INSTALL_DATADIR}/tavo OPTIONAL)
 
 install(FILES README.md CHANGELOG.md packaging/copyright DESTINATION ${CMAKE_INSTALL_DOCDIR})
