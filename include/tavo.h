@@ -2,7 +2,7 @@
  * The public C interface of libtavo: the highlight and the beats of a song.
  *
  * In: the path of an audio file and an analysis mode. Out: one TAVO_INFO, delivered once through a
- * callback on a thread of the library. A whole program:
+ * callback on a thread of the library. A complete program:
  *
  * @code{.c}
  * #include <semaphore.h>
@@ -30,8 +30,8 @@
  * }
  * @endcode
  *
- * What it does not do: it does not analyse two files at a time in one process, take audio from
- * memory, or report progress. Use several processes for several files.
+ * The library does not analyse two files at a time in one process, take audio from memory, or
+ * report progress. Use several processes for several files.
  *
  * States of an instance, and what each call returns in it:
  *
@@ -44,22 +44,22 @@
  *
  * Threads: call the functions from one thread, or from several that take turns. The callback runs
  * on a thread of the library; there, the tavo_get_ functions, tavo_has_audio and tavo_is_complete
- * are allowed and tavo_deinit returns -4. tavo_probe and tavo_error_text may be called on any
- * thread, at any time.
+ * are allowed, and tavo_deinit returns -4. tavo_probe and tavo_error_text may be called on any
+ * thread at any time.
  *
  * Binary compatibility: within one major version, functions, codes and the fields of TAVO_PARAM and
- * TAVO_INFO keep their meaning, order and size; a minor version adds functions only. The library's
- * file name ends in the major version. Other exported names serve the library and its tests and
- * carry no such promise.
+ * TAVO_INFO keep their meaning, order and size; a minor version only adds functions. The library's
+ * file name ends in the major version. Other exported names serve the library and its tests and are
+ * not covered by this promise.
  */
 #ifndef TAVO_H
 #define TAVO_H
 
 #include <stdint.h>
 
-#define TAVO_VERSION_MAJOR 1 /**< breaks programs when it changes */
-#define TAVO_VERSION_MINOR 0 /**< adds functions */
-#define TAVO_VERSION_PATCH 0 /**< changes no declaration */
+#define TAVO_VERSION_MAJOR 1 /**< changes break programs */
+#define TAVO_VERSION_MINOR 0 /**< changes add functions */
+#define TAVO_VERSION_PATCH 0 /**< changes leave the declarations alone */
 
 #ifdef __cplusplus
 extern "C" {
@@ -79,7 +79,7 @@ enum {
     TAVO_ERR_MEMORY = -2,    /**< out of memory, or a thread could not be started */
     TAVO_ERR_FORMAT = -3,    /**< unusable file: format, stream parameters, length, rate */
     TAVO_ERR_HANDLE = -4,    /**< bad handle or argument; from tavo_init: the file is unusable */
-    TAVO_ERR_NOT_READY = -5, /**< tavo_analyze on an instance whose job was started before */
+    TAVO_ERR_NOT_READY = -5, /**< the job of the instance was started before */
     TAVO_ERR_READ = -6,      /**< a media source could not read or decode */
     TAVO_ERR_OPEN = -7,      /**< a file cannot be opened or has no usable audio stream */
     TAVO_ERR_SHORT = -8,     /**< tavo_probe: the audio lasts 1 s or less */
@@ -87,15 +87,15 @@ enum {
     TAVO_ERR_CODEC = -255    /**< the codec library could not be set up or has no decoder */
 };
 
-/** Limits of what can be analysed. */
+/** Limits of the files that can be analysed. */
 enum {
-    TAVO_PATH_BYTES = 512,    /**< a path and its terminator fit into as many bytes */
-    TAVO_MIN_FILE_BYTES = 16, /**< bytes that a file needs to be recognised */
+    TAVO_PATH_BYTES = 512,    /**< size of the longest path, with its terminator */
+    TAVO_MIN_FILE_BYTES = 16, /**< smallest file that can be recognised */
     TAVO_MIN_RATE = 8000,     /**< lowest sample rate, Hz */
-    TAVO_MAX_RATE = 48000     /**< highest sample rate of every format but FLAC, Hz */
+    TAVO_MAX_RATE = 48000     /**< highest sample rate, except for FLAC, Hz */
 };
 
-/** The loudness curve: one value for every hop, taken over a window that starts there. */
+/** The loudness curve: one value per hop, measured over a window that starts there. */
 enum {
     TAVO_LOUDNESS_HOP_MS = 2000,   /**< from the start of one window to the start of the next */
     TAVO_LOUDNESS_WINDOW_MS = 6000 /**< length of a window */
@@ -121,22 +121,24 @@ typedef struct TAVO_INFO {
 /** The audio stream of a file, as the file states it. */
 typedef struct TAVO_STREAM {
     int32_t rate;        /**< sample rate in Hz */
-    int32_t channels;    /**< channels that the decoder gives */
+    int32_t channels;    /**< channels of the decoder's output */
     int64_t duration_ms; /**< duration in ms, rounded down */
 } TAVO_STREAM;
 
-/** Receives the result, once per job, on the job's worker thread. Must not call tavo_deinit, which
- * returns -4 there: let another thread do it. */
+/** Receives the result, once per job, on the job's worker thread. Must not call tavo_deinit,
+ * which returns -4 there; another thread can. */
 typedef void (*TAVO_CALLBACK)(TAVO_INFO *info);
 
-/** The same, with the pointer that was passed to tavo_set_listener. */
+/** Receives the result as TAVO_CALLBACK does, and the pointer that was passed to
+ * tavo_set_listener. */
 typedef void (*TAVO_LISTENER)(TAVO_INFO *info, void *user);
 
-/** Opens a file, reads its format and closes it again: whether tavo_init can use the file, and if
- * not, why. Needs no instance. *stream receives the stream if the result is 0, -8 or -9, and is
- * zeroed otherwise; stream may be null.
+/** Opens a file, reads its format and closes it, to find out whether tavo_init can use it. Needs no
+ * instance. If the result is 0, -8 or -9, *stream receives the stream; otherwise it is zeroed.
+ * stream may be null.
  *
- * Returns 0 if the file can be used, or the reason why not:
+ *
+ * Returns 0 if the file can be used, or the reason why it cannot:
  * - -2: out of memory;
  * - -3: the format is unknown or refused, its sample rate or coding is not supported, or the path
  *   has 512 bytes or more;
@@ -148,15 +150,14 @@ typedef void (*TAVO_LISTENER)(TAVO_INFO *info, void *user);
  * - -255: the codec library failed. */
 int32_t tavo_probe(const char *path, TAVO_STREAM *stream);
 
-/** An English clause for a return code, without a period at its end: "the file cannot be opened or
- * has no audio stream". Never null; the string is static. */
+/** Returns an English clause for a return code, without a final period: "the file cannot be
+ * opened or has no audio stream". Never null; the string is static. */
 const char *tavo_error_text(int32_t code);
 
 /** Opens the file, reads its format and plans the decoding.
  *
- * Only one instance may exist in a process, and the caller must see to it: a second tavo_init
- * before the tavo_deinit of the first succeeds, but the two share their locks and may wait for
- * ever.
+ * Only one instance may exist in a process, and the caller must ensure it: a second tavo_init
+ * before the tavo_deinit of the first succeeds, but the two share their locks and may wait forever.
  *
  * Returns the instance, owned by the caller until tavo_deinit, with *err 0. On failure returns
  * null, releases everything, and sets *err to -2 (out of memory) or -4 (the file cannot be used,
@@ -167,59 +168,60 @@ TAVO_CTX *tavo_init(const TAVO_PARAM *param, int32_t *err);
 /** Stores the callback. Call it before tavo_analyze. Checks nothing. */
 void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback);
 
-/** Stores a listener instead of a callback, and the pointer to pass to it, which the library does
- * not read. Call it before tavo_analyze, on an instance that tavo_init returned; the later one of
- * tavo_setcallback and tavo_set_listener counts. A null listener means none. Returns 0; -4 bad
- * handle (nothing is stored). */
+/** Stores a listener instead of a callback, and the pointer to pass to it, which the library
+ * does not read. Call it before tavo_analyze, on an instance that tavo_init returned. The last
+ * call of tavo_setcallback or tavo_set_listener counts. A null listener removes it. Returns 0;
+ * -4 bad handle, with nothing stored. */
 int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 
-/** Starts the one job of the instance on a thread of its own and returns at once.
- * - hl_param: the highlight length wanted, in seconds; 0 or less for none (modes 0 and 2).
+/** Starts the one job of the instance on its own thread and returns immediately.
+ * - hl_param: requested length of the highlight in seconds; 0 or less for none (modes 0 and 2).
  * - max_beats: maximum number of threshold-selected beats; 0 or less for no limit (modes 1 and 2).
  * - beat_param2: not used.
  *
  * Returns 0 started; -2 the thread could not be started (the instance stays ready); -4 bad handle,
- * or a mode outside 0 to 2; -5 started before. The callback is called only after a 0. */
+ * or a mode outside 0 to 2; -5 started before. The callback is called only if it returned 0. */
 int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_beats, int32_t beat_param2);
 
-/** Stops a running job, waits until its callback has returned, and releases the instance. A stop
- * takes as long as decoding and the highlight search still need.
- * Returns 0; -4 bad handle, or called from inside the callback (nothing is changed). */
+/** Stops a running job, waits until its callback has returned, and releases the instance. Decoding
+ * and the highlight search run to their end before the job stops.
+ * Returns 0; -4 bad handle, or called from inside the callback, with nothing changed. */
 int32_t tavo_deinit(TAVO_CTX *ctx);
 
-/** The stream's sample rate in Hz, the channels that its decoder gives, and its duration in ms as
- * the file states it. A null pointer leaves that value out. Known as soon as tavo_init has
- * returned. Returns 0; -4 bad handle (nothing is written). */
+/** Gives the stream's sample rate in Hz, the channels of the decoder's output, and the duration
+ * in ms that the file states. A value with a null pointer is skipped. Valid after tavo_init.
+ * Returns 0; -4 bad handle, with nothing written. */
 int32_t tavo_get_stream(const TAVO_CTX *ctx, int32_t *rate, int32_t *channels,
                         int64_t *duration_ms);
 
-/** The tempo in beats per minute, once a job of mode 1 or 2 has succeeded: call it in the callback
- * or after it. Mode 2 takes the tempo of the music from the highlight on. Returns 30 to 200; 0
- * before the job's end, after a failure, in mode 0, or for a bad handle. */
+/** Returns the tempo in beats per minute, 30 to 200, once a job of mode 1 or 2 has succeeded;
+ * call it in the callback or after it. In mode 2 it is the tempo of the music from the
+ * highlight on. Returns 0 before the end of the job, after a failure, in mode 0, or for a bad
+ * handle. */
 int32_t tavo_get_tempo(const TAVO_CTX *ctx);
 
-/** Reports whether the job could decode any audio: call it in the callback or after it. A highlight
- * at 0 of a file without any is no result. Returns 1; 0 before the job's end, if nothing was
- * decoded, or for a bad handle. */
+/** Returns 1 if the job decoded any audio; call it in the callback or after it. Without audio, a
+ * highlight at 0 is not a result. Returns 0 before the end of the job, if nothing was decoded,
+ * or for a bad handle. */
 int32_t tavo_has_audio(const TAVO_CTX *ctx);
 
-/** Reports whether the job decoded the file to its end: call it in the callback or after it. A
- * result is delivered even if the file could not be read to its end or memory ran out; it then
- * holds for the part that was analysed. Returns 1; 0 before the job's end, if something is missing,
- * or for a bad handle. */
+/** Returns 1 if the job decoded the file to its end; call it in the callback or after it. Returns
+ * 0 if the file could not be read to its end or memory ran out; the result is then that of the part
+ * that was analysed. Also returns 0 before the end of the job and for a bad handle. */
 int32_t tavo_is_complete(const TAVO_CTX *ctx);
 
-/** The loudness curve of the file, once a job of mode 0 or 2 has ended: value i is taken over the
- * window that starts at i * TAVO_LOUDNESS_HOP_MS. A value is 10 * log10(m + 1), m the mean square
- * of the samples with full scale 1.0: 0 for silence, 3.01 for a square wave at full scale. Returns
- * the curve, [*count] and valid until tavo_deinit; null with *count 0 before the job's end, in mode
- * 1, for audio shorter than a window, or for a bad handle. count must not be null. */
+/** Returns the loudness curve of the file, once a job of mode 0 or 2 has ended. Value i is
+ * measured over the window that starts at i * TAVO_LOUDNESS_HOP_MS. It is 10 * log10(m + 1),
+ * where m is the mean square of the samples with full scale 1.0: 0 for silence, 3.01 for a
+ * square wave at full scale. The curve has *count values and is valid until tavo_deinit.
+ * Returns null with *count 0 before the end of the job, in mode 1, for audio shorter than a
+ * window, or for a bad handle. count must not be null. */
 const float *tavo_get_loudness(const TAVO_CTX *ctx, int32_t *count);
 
-/** The path of the diagnostic click track (mono 16-bit WAV at 11025 Hz), which modes 1 and 2 write
- * at the end of every beat analysis, overwriting the file. By default it names a file in the
- * working directory. A program that wants no file sets an empty path, one that wants it elsewhere
- * another path, before tavo_analyze and not while a job runs. The string is not copied and not
+/** The path of the diagnostic click track (mono 16-bit WAV at 11025 Hz). Modes 1 and 2 write it
+ * at the end of every beat analysis and overwrite an existing file. By default it is in the
+ * working directory. To write no file, set an empty path; to write it elsewhere, set another
+ * path. Set it before tavo_analyze, not while a job runs. The string is not copied and not
  * freed. */
 extern const char *fnamedec;
 
