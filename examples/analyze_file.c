@@ -9,7 +9,7 @@
 #include <stdlib.h>
 #include <tavo.h>
 
-/* Passed from the library's thread to the main thread. */
+/* Passes the result from the library's thread to the main thread. */
 struct result {
     pthread_mutex_t lock;
     pthread_cond_t changed;

@@ -1,4 +1,4 @@
-# Packs what is in FOLDER, except build files, into the jar OUTPUT, with MANIFEST, by the program JAR.
+# Packs the files of FOLDER, except build files, into the jar OUTPUT with MANIFEST. JAR is the program.
 file(GLOB_RECURSE files RELATIVE ${FOLDER} ${FOLDER}/*)
 list(FILTER files EXCLUDE REGEX "CMakeLists|cmake$|\\.in$")
 set(arguments "")

@@ -1,4 +1,4 @@
-"""Adds what CMake builds to the package: the library, its private libraries and the command."""
+"""Adds to the package what CMake builds: the library, its private libraries and the command."""
 
 import os
 import pathlib
@@ -33,7 +33,7 @@ class BuildWithLibrary(build_py):
 
 
 class PlatformWheel(bdist_wheel):
-    """Any Python 3, this platform."""
+    """A wheel for any Python 3 on this platform."""
 
     def get_tag(self) -> "tuple[str, str, str]":
         return ("py3", "none", super().get_tag()[2])

@@ -4,7 +4,7 @@
     >>> song = tavo.analyze("song.mp3")
     >>> song.highlight_ms, song.tempo_bpm, song.beats[:3]
 
-libtavo.so analyses one song at a time in this process; the command tavo analyses several at once.
+libtavo.so analyses one song at a time in a process; the command tavo analyses several at once.
 """
 
 from ._library import analyze

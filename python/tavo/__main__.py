@@ -1,4 +1,4 @@
-"""python3 -m tavo: the command tavo."""
+"""Runs the command tavo: python3 -m tavo."""
 
 import os
 import sys

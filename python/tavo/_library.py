@@ -1,4 +1,4 @@
-"""One song at a time, through libtavo.so in this process."""
+"""Analyses one song at a time, by libtavo.so in this process."""
 
 from __future__ import annotations
 
@@ -59,15 +59,16 @@ def analyze(song: Union[Path, Samples], rate: Optional[int] = None, *, mode: str
             length: int = 0, max_beats: int = 0) -> Result:
     """Analyses one song and waits for the result.
 
-    song: the path of a file; or, with rate, its samples: shape (n,) or (n, channels), floats with
-        full scale 1.0 or int16. The mean of the channels is analysed.
+    song: the path of a file; or, with rate, samples of shape (n,) or (n, channels), as int16 or as
+        floats with full scale 1.0. The mean of the channels is analysed.
     rate: sample rate of the samples in Hz; None for a file.
-    mode: "highlight", "beats", or "both": the highlight, then the beats from there on.
-    length: length of the highlight wanted in seconds, 0 for none.
-    max_beats: maximum number of threshold-selected beats, 0 for no limit.
+    mode: "highlight", "beats" or "both"; "both" finds the beats from the highlight on.
+    length: requested length of the highlight in seconds; 0 for none.
+    max_beats: maximum number of threshold-selected beats; 0 for no limit.
 
     Raises TavoError if the song cannot be read to its end or nothing was found in it, ValueError for
-    wrong arguments. Calls from several threads take turns: use analyze_many for several songs at once.
+    invalid arguments. Calls from several threads run one after another; analyze_many analyses several
+    songs at once.
     """
     number = check(mode, length, max_beats)
     if isinstance(song, (str, bytes, os.PathLike)):

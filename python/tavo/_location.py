@@ -1,6 +1,6 @@
-"""Where the library and the command are, relative to this package.
+"""Paths of the library and the command, relative to this package.
 
-The two constants are those of a wheel, which contains both; cmake --install writes its own.
+The two constants are for a wheel, which contains both. cmake --install replaces them.
 """
 
 import os

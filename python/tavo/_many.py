@@ -1,4 +1,4 @@
-"""Many songs, through the command tavo, whose worker processes run several at once."""
+"""Analyses many songs with the command tavo, whose worker processes run several at once."""
 
 from __future__ import annotations
 
@@ -25,10 +25,10 @@ def analyze_many(
 ) -> Iterator[Union[Result, TavoError]]:
     """Analyses several songs at a time and yields their results in the order of the paths.
 
-    A song that cannot be analysed is yielded as a TavoError; the others continue.
-    jobs: number of worker processes, one song each; None for one per processor.
-    progress: called after each song with the number done and the number of paths.
-    mode, length, max_beats: as for analyze. A folder among the paths means the songs in it.
+    If a song cannot be analysed, its result is a TavoError; the others continue.
+    jobs: number of worker processes, each with one song at a time; None for one per processor.
+    progress: called after each song with the number of finished songs and the number of paths.
+    mode, length, max_beats: as for analyze. A folder stands for the songs in it.
     """
     check(mode, length, max_beats)
     names = [os.fsencode(path) for path in paths]
@@ -70,7 +70,7 @@ def _feed(pipe: IO[bytes], names: List[bytes]) -> None:
         with pipe:
             for name in names:
                 pipe.write(name + b"\0")
-    except BrokenPipeError:  # the command has ended, which _run reports
+    except BrokenPipeError:  # _run reports that the command has ended
         pass
 
 

@@ -16,7 +16,7 @@ MODES = ("highlight", "beats", "both")  # in the order of the library's numbers
 
 @dataclass(frozen=True, eq=False)
 class Result:
-    """One song's result. Times count from the start of the file.
+    """The result of one song. Times count from the start of the file.
 
     path: the file as it was named; "" for samples.
     highlight_ms: start of the highlight in milliseconds; None in mode "beats".
@@ -26,7 +26,7 @@ class Result:
     duration_s: length of the stream in seconds.
     sample_rate: sample rate of the stream in Hz.
 
-    Results are equal if all their values are, and can be members of a set or keys of a dict.
+    Results are equal if all their values are. They are hashable.
     """
 
     path: str
@@ -50,15 +50,15 @@ class Result:
         return hash(self._key())
 
     def to_dict(self) -> Dict[str, Any]:
-        """The fields as plain values, which json.dumps accepts."""
+        """Returns the fields as plain values, which json.dumps accepts."""
         return {**vars(self), "beats": self.beats.tolist()}
 
     def to_mirex(self) -> str:
-        """The beats as MIREX exchanges them: a time in seconds a line."""
+        """Returns the beats in the MIREX format: one time in seconds per line."""
         return "".join(f"{time:.6f}\n" for time in self.beats)
 
     def to_jams(self) -> Dict[str, Any]:
-        """The result in JAMS: the namespaces beat and tempo, and a tag_open "highlight" at its start."""
+        """Returns the result in JAMS: the namespaces beat and tempo, and a tag_open "highlight" at its start."""
         annotations = []
         if self.tempo_bpm is not None:
             start = self.highlight_ms / 1000.0 if self.highlight_ms is not None else 0.0
@@ -86,7 +86,7 @@ class Result:
 
 
 def _observation(time: float, duration: float, value: Union[int, str, None]) -> Dict[str, Any]:
-    confidence = 1.0 if isinstance(value, int) else None  # which the namespace tempo demands
+    confidence = 1.0 if isinstance(value, int) else None  # required by the namespace tempo
     return {"time": time, "duration": duration, "value": value, "confidence": confidence}
 
 
@@ -99,7 +99,7 @@ class TavoError(Exception):
 
 
 def check(mode: str, length: int, max_beats: int) -> int:
-    """The library's number of the mode. ValueError for arguments that the library cannot take."""
+    """Returns the library's number of the mode. Raises ValueError for invalid arguments."""
     if mode not in MODES:
         raise ValueError(f"mode must be one of {', '.join(MODES)}, not {mode!r}")
     for name, value in (("length", length), ("max_beats", max_beats)):

@@ -1,4 +1,4 @@
-"""Samples in memory as a file that the library can open."""
+"""Writes samples to a file in memory, which the library can open."""
 
 from __future__ import annotations
 
@@ -16,7 +16,7 @@ _MAX_BYTES = 0xFFFFFFFF - _HEADER.size
 
 
 def to_mono(samples: Samples) -> npt.NDArray[np.int16]:
-    """The mean of the channels as 16-bit samples. Floats have full scale 1.0 and are clipped there.
+    """Returns the mean of the channels as 16-bit samples. Floats are clipped to full scale, 1.0.
 
     samples: shape (n,) or (n, channels), floating-point or int16. A pair of int16 channels gives the
     samples that the library computes for the same pair in a file.
@@ -41,7 +41,7 @@ def to_mono(samples: Samples) -> npt.NDArray[np.int16]:
 
 @contextlib.contextmanager
 def memory_file(mono: npt.NDArray[np.int16], rate: int) -> Iterator[bytes]:
-    """The path of a WAV file in memory, which exists during the with block."""
+    """Yields the path of a WAV file in memory, which exists during the with block."""
     data = mono.astype("<i2").tobytes()
     if len(data) > _MAX_BYTES:
         raise ValueError(f"samples must be at most {_MAX_BYTES // 2} for each channel, not {len(mono)}")

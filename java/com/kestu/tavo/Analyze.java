@@ -17,7 +17,7 @@ import java.util.concurrent.CountDownLatch;
  * {@code PREFIX/lib} after an installation, where the jar is
  * {@code PREFIX/share/java/tavo.jar}.
  *
- * <p>Exit status: 0, 1 when a file failed, 2 for wrong usage.
+ * <p>Exit status: 0 on success, 1 if a file failed, 2 for wrong usage.
  */
 public final class Analyze {
     private static final String USAGE =
@@ -77,7 +77,7 @@ public final class Analyze {
         return value;
     }
 
-    /** Returns whether every file had a result. */
+    /** Returns true if every file has a result. */
     private boolean run() throws UnsupportedEncodingException {
         Tavo.disableClickTrack();
         boolean allDone = true;
@@ -95,7 +95,7 @@ public final class Analyze {
         return allDone;
     }
 
-    /** The outcome of one file; {@code error} is null for a result. */
+    /** The outcome of one file; {@code error} is null on success. */
     private static final class Outcome implements TavoListener {
         final CountDownLatch done = new CountDownLatch(1);
         String error;
@@ -168,7 +168,7 @@ public final class Analyze {
         return text.toString();
     }
 
-    /** m:ss.t, or h:mm:ss.t from an hour on. */
+    /** Formats a time as m:ss.t, or as h:mm:ss.t from an hour on. */
     private static String clock(double ms) {
         long tenths = Math.round(ms / 100.0);
         long whole = tenths / 10;

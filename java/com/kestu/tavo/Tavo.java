@@ -14,7 +14,7 @@ import java.lang.ref.WeakReference;
  * }</pre>
  *
  * <p><b>One analysis in a process.</b> All objects of this class share one native analysis, and the
- * object that was created last gets the events: create one and keep it.
+ * object that was created last receives the events: create one object and keep it.
  *
  * <p><b>Order.</b> {@code init}, {@code analyze} once, the event once, {@code deinit}; then
  * {@code init} again for the next file. {@code deinit} is allowed at any time after {@code init}.
@@ -24,16 +24,16 @@ import java.lang.ref.WeakReference;
  * several that take turns. {@code init} reads from the file and {@code deinit} waits for a running
  * job, so do not call them on a user-interface thread. Events come on a thread of the library.
  *
- * <p><b>Lifetime.</b> The library holds this object by a weak reference: keep a reference of your
- * own until the event has come, or it is dropped. Only {@code deinit} releases the native analysis;
- * if an object is lost before its {@code deinit}, that of the next object releases it.
+ * <p><b>Lifetime.</b> The library holds this object by a weak reference. Keep your own reference
+ * until the event has arrived, or the event is lost. Only {@code deinit} releases the native
+ * analysis; if an object is lost before its {@code deinit}, the next object's releases it.
  *
  * <p><b>Click track.</b> The modes with beats write a diagnostic WAV file into the working
  * directory unless {@link #disableClickTrack} was called. On Android the working directory is not
- * writable and no file appears.
+ * writable, so no file is written.
  *
  * <p><b>Paths.</b> A path with characters outside the basic multilingual plane, such as emoji, is
- * not found, because Java passes them in an encoding of its own. Open such a file and pass {@code
+ * not found, because Java passes them in its own encoding. Open such a file and pass {@code
  * "/proc/self/fd/" + number}, which also works for a descriptor without a name. Keep the descriptor
  * open until {@code init} has returned.
  */
@@ -65,7 +65,7 @@ public final class Tavo implements AutoCloseable {
     private final TavoListener listener;
 
     /**
-     * Creates the object that receives the events from now on.
+     * Creates the object that receives all later events.
      *
      * @param listener receives the result of each analysis, not null
      */
@@ -77,13 +77,13 @@ public final class Tavo implements AutoCloseable {
 
     /**
      * Stops the library from writing its diagnostic click track, a WAV file in the working
-     * directory that every analysis with beats overwrites. It holds for the whole process and
-     * cannot be undone. Call it before {@link #analyze}.
+     * directory that every analysis with beats overwrites. The call affects the whole process and
+     * cannot be undone. Make it before {@link #analyze}.
      */
     public static native void disableClickTrack();
 
     /**
-     * Says why a file cannot be analysed. Needs no open analysis.
+     * Returns the reason why a file cannot be analysed. Needs no open analysis.
      *
      * @param path the file, may be null
      * @return an English clause without a period, or null if the file can be analysed
@@ -91,8 +91,8 @@ public final class Tavo implements AutoCloseable {
     public static native String reason(String path);
 
     /**
-     * Says whether the analysis decoded the file to its end. Valid from the event until
-     * {@link #deinit}. An event without it is a failure.
+     * Returns true if the analysis decoded the file to its end. Valid from the event until
+     * {@link #deinit}. If it did not, the event is a failure.
      *
      * @return false also before the event, after a stop, and without {@link #init}
      */
@@ -104,48 +104,48 @@ public final class Tavo implements AutoCloseable {
     /**
      * Opens a file and prepares its analysis.
      *
-     * @param path the file, fewer than 512 bytes in UTF-8; null is answered with
+     * @param path the file, fewer than 512 bytes in UTF-8; for null the result is
      *     {@link #ERROR_UNUSABLE}
      * @param mode one of the modes above
-     * @return 0, {@link #ERROR_BUSY}, {@link #ERROR_MEMORY} or {@link #ERROR_UNUSABLE}; nothing
-     *     changes on an error, and {@link #reason} has the reason
+     * @return 0, {@link #ERROR_BUSY}, {@link #ERROR_MEMORY} or {@link #ERROR_UNUSABLE}; an error
+     *     changes nothing, and {@link #reason} returns its reason
      */
     public native int init(String path, int mode);
 
     /**
-     * Starts the analysis on a thread of its own.
+     * Starts the analysis on its own thread.
      *
-     * @param highlightSeconds highlight length wanted, 0 for none; not used in {@link #MODE_BEATS}
+     * @param highlightSeconds requested highlight length, 0 for none; not used in {@link #MODE_BEATS}
      * @param maxBeats maximum number of threshold-selected beats, 0 for no limit; not used in
      *     {@link #MODE_HIGHLIGHT}
      * @param reserved not used, 0
-     * @return 0 if started, -1 if not (it was started before); also 0 without {@code init}, in
-     *     which case nothing happens and no event comes
+     * @return 0 if started, -1 if not (it was started before); also 0 without {@code init}, when
+     *     nothing happens and no event follows
      */
     public native int analyze(int highlightSeconds, int maxBeats, int reserved);
 
     /**
      * Ends the analysis: stops a running job, waits for its event and releases everything.
      *
-     * @return 0, also if nothing was open; -1 if called by a listener
+     * @return 0, even if nothing was open; -1 if called by a listener
      */
     public native int deinit();
 
-    /** The same as {@link #deinit}. */
+    /** Same as {@link #deinit}. */
     @Override
     public void close() {
         deinit();
     }
 
     /**
-     * Called by the library once per analysis, on its worker thread. The library looks it up by
-     * name and signature.
+     * Called by the library once per analysis, on its worker thread. The library finds it by name
+     * and signature.
      *
      * @param ref the argument of {@code native_setup}
      * @param what 1 a result, 2 a failure
      * @param arg1 start of the highlight, milliseconds
      * @param arg2 number of beats
-     * @param beats the beat times in milliseconds, null when there are none
+     * @param beats the beat times in milliseconds, or null
      */
     private static void postEventFromNative(
             Object ref, int what, int arg1, int arg2, float[] beats) {

@@ -4,9 +4,9 @@ package com.kestu.tavo;
  * Receives the result of an analysis: exactly one call of one of these methods.
  *
  * <p>Both methods run on a thread of the library, never on the thread that called
- * {@link Tavo#analyze}; pass the values to your own thread before you touch a user interface.
- * Return soon, and do not call {@link Tavo#deinit}, which returns -1 there. The log says when a
- * method threw an exception, which is then dropped.
+ * {@link Tavo#analyze}. Pass the values to your own thread before you touch a user interface.
+ * Return soon, and do not call {@link Tavo#deinit}, which returns -1 there. If a method throws an
+ * exception, the library logs that and ignores it.
  */
 public interface TavoListener {
     /**
@@ -22,11 +22,11 @@ public interface TavoListener {
 
     /**
      * The analysis failed: it found no beats, was stopped, ran out of memory, or could not read the
-     * file to its end ({@link Tavo#isComplete} is false then).
+     * file to its end (then {@link Tavo#isComplete} is false).
      *
      * @param tavo the object whose {@code analyze} was called, not null
-     * @param highlightMs start of the highlight in milliseconds if {@link Tavo#MODE_BOTH} had found
-     *     it before the failure, else 0
+     * @param highlightMs start of the highlight in milliseconds if {@link Tavo#MODE_BOTH} found it
+     *     before the failure, otherwise 0
      */
     void onFailure(Tavo tavo, int highlightMs);
 }
