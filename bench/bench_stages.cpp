@@ -1,5 +1,5 @@
-// How the time of a job splits over its stages, on a 3-minute song of 120 BPM in stereo. The lines
-// whose names start with "mode 1" add up to a whole mode-1 job of a 44.1 kHz file.
+// Time of a job by stage, for a 3-minute stereo song of 120 BPM. The lines whose names start with
+// "mode 1" add up to a whole mode-1 job of a 44.1 kHz file.
 #include <benchmark/benchmark.h>
 
 #include <cstdlib>
@@ -89,7 +89,7 @@ void highlight(benchmark::State &state) {
     }
 }
 
-// A beat analysis up to the stage that is measured.
+// A beat analysis up to the measured stage.
 struct analysis {
     std::vector<double> ana;
     TAVO_ONSET_CTX onset{};
@@ -157,7 +157,7 @@ void placement(benchmark::State &state) {
     analysis a;
     open_analysis(&a);
     _getOnsetEnvelope(&a.beat, kFrameSize, kHopSize);
-    // More than any result: every frame, and the added beats.
+    // Larger than any result: every analysis frame and every added beat.
     std::vector<float> beats(static_cast<size_t>(a.beat.frame_count) + 50);
     for (auto _ : state) {
         benchmark::DoNotOptimize(getBeatCandi_MT(&a.beat, &a.onset, beats.data()));

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # bench/compare.sh [-n PAIRS] [-m MODE] FILE...
-# A whole analysis of each file against ffmpeg's bare decoding of it, one after the other in pairs:
-# medians of wall time, processor time and peak memory, and the ratios of each pair. Uses
+# Compares a whole analysis of each file with decoding the same file by ffmpeg. Runs them alternately in pairs and
+# prints the medians of wall time, processor time and peak memory, and the median ratios of the pairs. Uses
 # build/release/bin/tavo, or the command that TAVO names. Close other programs first.
 set -euo pipefail
 tavo=${TAVO:-$(dirname -- "${BASH_SOURCE[0]}")/../build/release/bin/tavo}

@@ -1,4 +1,5 @@
-# Debian's cross compiler, with the libraries that scripts/aarch64-sysroot.sh unpacks, and qemu.
+# Cross-compiles with Debian's compiler and the libraries that scripts/aarch64-sysroot.sh unpacks; runs programs in
+# qemu.
 set(CMAKE_SYSTEM_NAME Linux)
 set(CMAKE_SYSTEM_PROCESSOR aarch64)
 set(CMAKE_C_COMPILER aarch64-linux-gnu-gcc)
@@ -14,7 +15,7 @@ set(ENV{PKG_CONFIG_LIBDIR}
   ${CMAKE_SYSROOT}/usr/lib/aarch64-linux-gnu/pkgconfig:${CMAKE_SYSROOT}/usr/share/pkgconfig)
 set(CMAKE_CROSSCOMPILING_EMULATOR qemu-aarch64 -L ${CMAKE_SYSROOT})
 
-# jni.h is the same on every processor: this machine's JDK has it.
+# jni.h is the same for every processor, so this machine's JDK provides it.
 if(DEFINED ENV{JAVA_HOME})
   set(java_home $ENV{JAVA_HOME})
 else()

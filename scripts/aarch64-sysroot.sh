@@ -1,7 +1,7 @@
 #!/bin/sh
-# aarch64-sysroot.sh: unpacks Debian's arm64 libraries into build/aarch64-sysroot, for the cross
-# compiler and for qemu, and the two Android headers that the library includes. Adds no architecture
-# and no package to this system. Does nothing if the sysroot exists.
+# aarch64-sysroot.sh: unpacks Debian's arm64 libraries and the two Android headers that the library includes into
+# build/aarch64-sysroot, for the cross compiler and for qemu. Adds no architecture and no package to this system.
+# Does nothing if the sysroot exists.
 set -eu
 cd "$(dirname "$0")/.."
 root=$PWD/build/aarch64-sysroot

@@ -1,8 +1,8 @@
 #!/usr/bin/env bash
 # scripts/coverage.sh
-# Builds with counters, runs the tests and prints how many lines of the library and of the desktop's codec
-# library they executed. Fails below 97 % of the library or 90 % of the codec library; the lines that were
-# not executed are listed in build/coverage/*.txt.
+# Builds with coverage counters, runs the tests and prints how many lines of the library and of the desktop's codec
+# library they executed. Fails below 97 % of the library or 90 % of the codec library. Lists the lines that were not
+# executed in build/coverage/*.txt.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 bash scripts/setup.sh build tests measure
@@ -10,7 +10,7 @@ bash scripts/setup.sh build tests measure
 cmake --preset coverage >/dev/null
 cmake --build --preset coverage
 find build/coverage -name '*.gcda' -delete
-# Tests that only inspect files execute none of the lines.
+# Tests that only inspect files execute no lines.
 ctest --preset coverage --parallel "$(nproc)" -E '^(repo|packaging|android)\.'
 cover() { # cover NAME FLOOR FILTER
   echo "== $1"

@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # scripts/fuzz.sh [--keep] SECONDS [TARGET]...
-# Fuzzes each target (all five by default) for SECONDS, from its kept inputs (fuzz/corpus/TARGET.tar.gz
-# and fuzz/corpus/TARGET) and, where files are its inputs, the tests' short songs. A run of more than 2 s
-# fails. The input of a failure is kept in build/fuzz/findings. --keep then replaces the archive by the
-# smallest set of inputs that covers as much, those below 6 KiB.
+# Runs each fuzzer (all five by default) for SECONDS. It starts from its kept inputs (fuzz/corpus/TARGET.tar.gz and
+# fuzz/corpus/TARGET) and, if its inputs are files, from the tests' short songs. An input that takes more than 2 s
+# fails. Stores the input of a failure in build/fuzz/findings. --keep then replaces the archive by the smallest set
+# of inputs below 6 KiB with the same coverage.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 keep=
@@ -21,7 +21,7 @@ bash scripts/setup.sh build fuzz
 cmake --preset fuzz >/dev/null
 cmake --build --preset fuzz
 mkdir -p build/fuzz/findings
-# A short quarantine and no huge allocations: thousands of runs a second.
+# A short quarantine and no huge allocations allow thousands of runs per second.
 export ASAN_OPTIONS=allocator_may_return_null=1:max_allocation_size_mb=1024:quarantine_size_mb=8
 
 fuzz() { # fuzz TARGET

@@ -1,10 +1,9 @@
 #!/usr/bin/env bash
 # scripts/test-cluster.sh [BUILD]
-# Runs packaging/cluster/tavo.sbatch on a Slurm of one node with two slots, into a PostgreSQL, both on
-# the loopback interface and both started and stopped here: 121 inputs, one of them not audio, one
-# task killed half-way and requeued. Compares every row with a plain run. Needs root (the database's
-# server refuses to run as root, Slurm's to switch users otherwise) and
-# scripts/setup.sh build tests cluster.
+# Runs packaging/cluster/tavo.sbatch on a Slurm of one node with two slots, with a PostgreSQL store. Starts and
+# stops both on the loopback interface. The list has 121 inputs, one of them not audio; one task is killed half-way
+# and requeued. Compares every row with a plain run. Needs root, because the PostgreSQL server must not run as root
+# and Slurm's must, and scripts/setup.sh build tests cluster.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 root=$PWD

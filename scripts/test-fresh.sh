@@ -1,8 +1,8 @@
 #!/usr/bin/env bash
 # scripts/test-fresh.sh [COMMAND]...
-# Before a release, as root, an hour or more: makes a bare Debian 12 root, clones the last commit into
-# it under /root and runs the README's first commands, or the COMMANDs instead. Mounts nothing of this
-# machine: /proc is mounted anew, /dev contains a few new device nodes.
+# For use before a release, as root; takes an hour or more. Makes a bare Debian 12 root, clones the last commit into
+# it under /root and runs the README's first commands, or the COMMANDs. Mounts nothing of this machine: /proc is a
+# new mount, and /dev contains a few new device nodes.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $(id -u) -ne 0 ]]; then

@@ -7,5 +7,5 @@ if [[ $# -eq 0 ]]; then
   mapfile -t files < <(find common dsp media_source pcm highlight beat core jni cli desktop -name '*.cpp' | sort)
   set -- "${files[@]}"
 fi
-# Standard error only counts suppressed warnings; an error shows in the exit status.
+# Standard error only reports the number of suppressed warnings; the exit status reports errors.
 printf '%s\0' "$@" | xargs -0 -P "$(nproc)" -n 3 clang-tidy -p build/release --quiet 2>/dev/null
