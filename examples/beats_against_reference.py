@@ -24,7 +24,7 @@ def main() -> int:
     except tavo.TavoError as error:
         print(f"{error.path}: {error}", file=sys.stderr)
         return 1
-    # The scores of onsets are those of beats without the rule that leaves out the first 5 s.
+    # mir_eval's scores for beats ignore the first 5 s, but its scores for onsets do not.
     f_measure, precision, recall = mir_eval.onset.f_measure(reference, song.beats, window=TOLERANCE)
     print(f"tempo {song.tempo_bpm} BPM, {len(song.beats)} beats, {len(reference)} in the reference")
     print(f"precision {precision:.3f}  recall {recall:.3f}  F-measure {f_measure:.3f}")

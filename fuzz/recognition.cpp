@@ -1,5 +1,5 @@
-// Recognition of a file's format. Zeros in the middle let a short input reach the scan's limits of
-// 32 KiB.
+// Recognition of a file's format. Zeros in the middle make a short input reach the limit of the
+// scan, 32 KiB.
 #include "fuzz/fuzz.h"
 #include "media_source/mtsrc.h"
 
@@ -11,10 +11,11 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     fuzz::input in(data, size);
     const bool far = in.ConsumeIntegralInRange(0, 31) == 31;  // a hundred times slower
     const auto gap = far ? in.ConsumeIntegralInRange<size_t>(32'000, 32'764) : 0;
-    const int64_t start = in.ConsumeBool() ? 3 : 0;  // recognition starts at the file's offset
+    const int64_t start =
+        in.ConsumeBool() ? 3 : 0;  // recognition starts at the current file offset
     auto bytes = in.ConsumeRemainingBytes<uint8_t>();
     bytes.insert(bytes.begin() + static_cast<ptrdiff_t>(bytes.size() / 2), gap, 0);
-    std::string path = fuzz::file_of(bytes);
+    std::string path = fuzz::write_file(bytes);
     mtsrc_io io = {};
     mtsrc_file_callbacks(&io);
     io.path = path.data();

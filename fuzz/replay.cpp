@@ -1,5 +1,6 @@
-// replay RUNS DIR...: passes every file in the DIRs to the fuzzer's function, then RUNS inputs made
-// from them, the same each time. The input of a failure is left in the program's path with .last.
+// replay RUNS DIR...: passes every file in the DIRs to the fuzzer's function, then RUNS inputs
+// derived from them, the same ones each time. After a failure the input is in the program's path
+// plus .last.
 #include <fcntl.h>
 
 #include <ctime>
@@ -17,26 +18,25 @@ size_t below(size_t limit) {
     return limit == 0 ? 0 : random_numbers() % limit;
 }
 
-// A kept input, whole or cut, with some bytes changed, half of the time near its start, and random
-// choices at its end; or random bytes alone.
+// Returns a kept input, complete or truncated, with some changed bytes, half of the time near its
+// start, and random choices at its end; or only random bytes.
 bytes next_input(const std::vector<bytes> &kept) {
     const auto random_byte = [] { return static_cast<uint8_t>(random_numbers()); };
-    const bool made_up = below(2) == 0;
-    bytes input = made_up ? bytes(below(2000)) : kept[below(kept.size())];
+    const bool random_only = below(2) == 0;
+    bytes input = random_only ? bytes(below(2000)) : kept[below(kept.size())];
     if (below(8) == 0) input.resize(below(input.size() + 1));
-    const size_t reach = below(2) == 0 ? std::min<size_t>(input.size(), 256) : input.size();
-    for (size_t i = reach > 0 ? below(16) : 0; i > 0; --i) input[below(reach)] = random_byte();
-    const size_t tail = std::min(input.size(), made_up ? SIZE_MAX : 1 + below(64));
+    const size_t range = below(2) == 0 ? std::min<size_t>(input.size(), 256) : input.size();
+    for (size_t i = range > 0 ? below(16) : 0; i > 0; --i) input[below(range)] = random_byte();
+    const size_t tail = std::min(input.size(), random_only ? SIZE_MAX : 1 + below(64));
     std::generate(input.end() - static_cast<ptrdiff_t>(tail), input.end(), random_byte);
     return input;
 }
 
 void run(int last, const bytes &input) {
-    fuzz::fill(last, input);
+    fuzz::replace_contents(last, input);
     const clock_t start = clock();
     LLVMFuzzerTestOneInput(input.data(), input.size());
-    fuzz::must(clock() - start <= RUN_SECONDS * CLOCKS_PER_SEC,
-               "a run takes no longer than it may");
+    fuzz::must(clock() - start <= RUN_SECONDS * CLOCKS_PER_SEC, "a run takes too long");
 }
 
 }  // namespace
@@ -58,6 +58,6 @@ int main(int argc, char **argv) {
     }
     fuzz::must(!kept.empty(), "there are kept inputs");
     for (long i = 0; i < atol(argv[1]); ++i) run(last, next_input(kept));
-    printf("%zu kept inputs, %s made ones\n", kept.size(), argv[1]);
+    printf("%zu kept inputs, %s variations\n", kept.size(), argv[1]);
     return 0;
 }

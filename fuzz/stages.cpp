@@ -1,5 +1,5 @@
-// The stages of the analysis: properties of their results, and plain forms of two of them. Threads
-// cannot be started here: workers run on the calling thread.
+// The stages of the analysis: properties of their results, and comparisons with plain
+// implementations. Threads cannot start here, so workers run on the calling thread.
 #include <pthread.h>
 
 #include <cerrno>
@@ -27,10 +27,10 @@ namespace {
 
 using fuzz::must;
 
-constexpr size_t kMostPoints = 400;
+constexpr size_t kMaxPoints = 400;
 
-std::vector<int16_t> read_pcm(fuzz::input *in, size_t most) {
-    std::vector<int16_t> pcm(std::min(in->remaining_bytes() / 2, most));
+std::vector<int16_t> read_pcm(fuzz::input *in, size_t max_samples) {
+    std::vector<int16_t> pcm(std::min(in->remaining_bytes() / 2, max_samples));
     if (!pcm.empty()) in->ConsumeData(pcm.data(), 2 * pcm.size());
     return pcm;
 }
@@ -43,10 +43,10 @@ int32_t choose_rate(fuzz::input *in) {
                                                      33075, 44100, 44099, 48000, 88200, 96000});
 }
 
-// The windowed-sinc converter, one sum after the other. Returns the samples appended to out, -1 for
-// a phase out of range.
-int64_t convert_plainly(const dorn_resampler_state &s, const std::vector<int16_t> &in,
-                        std::vector<int16_t> *out) {
+// A plain implementation of the windowed-sinc converter. Returns the number of samples appended to
+// out, or -1 for a phase out of range.
+int64_t convert_by_definition(const dorn_resampler_state &s, const std::vector<int16_t> &in,
+                              std::vector<int16_t> *out) {
     const auto len = static_cast<int64_t>(in.size());
     const float h = static_cast<float>(s.taps) / 2;
     for (int64_t j = 0;; ++j) {
@@ -74,8 +74,8 @@ int64_t convert_plainly(const dorn_resampler_state &s, const std::vector<int16_t
     }
 }
 
-// The interpolator alone, which takes several channels, and a whole conversion: its samples, or the
-// means of blocks, and cleared bytes.
+// Compares the interpolator, with several channels, and whole conversions. Their output consists of
+// samples of the interpolator or of block means, then of zero bytes.
 void convert(fuzz::input *in) {
     const auto state = std::make_unique<dorn_resampler_state>();
     const int32_t target = in->ConsumeBool() ? kAnalysisRate : choose_rate(in);
@@ -88,9 +88,10 @@ void convert(fuzz::input *in) {
     if (pcm.empty() || count * target / source > 8000) return;
     must(dorn_resampler_prepare(state.get(), source, target, channels) == 0, "rates are prepared");
     std::vector<int16_t> samples;
-    const int64_t code = convert_plainly(*state, pcm, &samples);
+    const int64_t code = convert_by_definition(*state, pcm, &samples);
     std::vector<int16_t> out(std::max<size_t>(samples.size(), 1));
-    std::vector<int16_t> loud(pcm.size() + 200, INT16_MAX);  // samples outside must not count
+    std::vector<int16_t> loud(pcm.size() + 200,
+                              INT16_MAX);  // samples outside the input must not count
     std::copy(pcm.begin(), pcm.end(), loud.begin() + 100);
     must(dorn_resampler_convert(state.get(), &loud[100], static_cast<int32_t>(count), out.data()) ==
              code,
@@ -108,22 +109,22 @@ void convert(fuzz::input *in) {
     }
     wanted.resize(length + 8);
     int64_t found = -1;
-    double *all = nullptr;
-    must(dorn_resampler_run(pcm.data(), 2 * count + odd, source, target, &found, &all) == 0 &&
+    double *output = nullptr;
+    must(dorn_resampler_run(pcm.data(), 2 * count + odd, source, target, &found, &output) == 0 &&
              found == static_cast<int64_t>(length),
          "a conversion has its length");
-    must(std::equal(wanted.begin(), wanted.end(), all), "a conversion is its samples and zeros");
-    free(all);
+    must(std::equal(wanted.begin(), wanted.end(), output), "a conversion is its samples and zeros");
+    free(output);
 }
 
 // --- 7: the highlight
 
-// count positions below n, ascending, of a list of at least room entries.
-std::vector<int32_t> choose_positions(fuzz::input *in, size_t count, size_t room, int32_t n) {
+// Returns count ascending positions below n. The list has at least capacity entries.
+std::vector<int32_t> choose_positions(fuzz::input *in, size_t count, size_t capacity, int32_t n) {
     std::vector<int32_t> list(count);
     for (int32_t &at : list) at = in->ConsumeIntegralInRange(0, n - 1);
     std::sort(list.begin(), list.end());
-    list.resize(std::max(room, count));
+    list.resize(std::max(capacity, count));
     return list;
 }
 
@@ -132,13 +133,13 @@ void select_region(fuzz::input *in) {
     const auto nseg = in->ConsumeIntegralInRange(0, 30);
     const int32_t length = in->ConsumeBool() ? in->ConsumeIntegral<uint8_t>()
                                              : in->ConsumeIntegralInRange(0, INT32_MAX / 2);
-    const int32_t n = in->ConsumeIntegralInRange(1, static_cast<int32_t>(kMostPoints));
+    const int32_t n = in->ConsumeIntegralInRange(1, static_cast<int32_t>(kMaxPoints));
     const int32_t chosen = in->ConsumeIntegralInRange(-1, n);
     const auto valleys = choose_positions(in, static_cast<size_t>(nv), 15, n);
     const auto pairs = choose_positions(in, static_cast<size_t>(2 * nseg), 0, n);
     const auto mean = in->ConsumeProbability<float>();
     const auto deviation = in->ConsumeProbability<float>();
-    const auto curve = fuzz::exactly<float>(in, static_cast<size_t>(n));
+    const auto curve = fuzz::padded_values<float>(in, static_cast<size_t>(n));
     const uint32_t start = tavo_select_highlight_region(
         curve.data(), n, length, chosen, nv, valleys.data(), pairs.data(), nseg, mean, deviation);
     must(start < static_cast<uint32_t>(n), "a region starts in the song");
@@ -150,7 +151,7 @@ void search_curve(fuzz::input *in) {
     hl.hl_param =
         in->ConsumeBool() ? in->ConsumeIntegral<int8_t>() : in->ConsumeIntegral<int32_t>();
     const bool free_length = in->ConsumeBool();
-    auto curve = fuzz::values<float>(in, kMostPoints);
+    auto curve = fuzz::values<float>(in, kMaxPoints);
     const auto n = static_cast<int32_t>(curve.size());
     const int32_t duration = free_length ? in->ConsumeIntegral<int32_t>() : 2 * n + 4;
     hl.power = curve.data();
@@ -166,8 +167,8 @@ void search_curve(fuzz::input *in) {
 
 // --- 4 to 6: beats
 
-// Tempo, threshold, candidates and gaps of an envelope whose values repeat.
-void place_beats(fuzz::input *in) {
+// Computes tempo, threshold, candidates and gaps of an envelope that repeats its values.
+void find_beats(fuzz::input *in) {
     const int32_t limit = in->ConsumeIntegralInRange(-2, 40);
     const int32_t free_tempo = in->ConsumeBool() ? in->ConsumeIntegralInRange(30, 200) : 0;
     const auto repeats = in->ConsumeIntegralInRange<size_t>(1, 16);
@@ -179,7 +180,7 @@ void place_beats(fuzz::input *in) {
     std::vector<double> silence(kHopSize * (frames - 1) + kFrameSize);
     TAVO_CTX ctx = {};
     TAVO_ONSET_CTX onset = {};
-    TAVO_BEAT_CTX of = {}, *beat = &of;
+    TAVO_BEAT_CTX context = {}, *beat = &context;
     onset.frame_size = kFrameSize;
     onset.hop_size = kHopSize;
     ctx.onset = &onset;
@@ -188,7 +189,7 @@ void place_beats(fuzz::input *in) {
     ctx.ana_rate = kAnalysisRate;
     __beat_init(&ctx, beat);
     must(beat->signal != nullptr && beat->frame_count == static_cast<int64_t>(frames),
-         "a context is made");
+         "a context is complete");
     std::vector<double> env(frames);
     for (size_t k = 0; k + 1 < frames; ++k)
         env[k] = std::isfinite(part[k % part.size()]) ? part[k % part.size()] : 0.0;
@@ -224,6 +225,6 @@ void place_beats(fuzz::input *in) {
 }  // namespace
 
 int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    fuzz::run_one({convert, select_region, search_curve, place_beats}, data, size);
+    fuzz::run_one({convert, select_region, search_curve, find_beats}, data, size);
     return 0;
 }

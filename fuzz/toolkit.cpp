@@ -1,4 +1,4 @@
-// The toolkit: each routine against its definition.
+// The functions of dsp/, each compared with its definition.
 #include <complex>
 
 #include "dsp/dft.h"
@@ -12,14 +12,14 @@ namespace {
 
 using fuzz::must;
 
-constexpr size_t kMostValues = 400;
+constexpr size_t kMaxValues = 400;
 
 struct signal {
     std::vector<double> re, im;
 };
 
-// The sum of count values of x with a factor that turns in n steps, taken at k turns; sign: -1
-// forward, 1 inverse, which divides by n.
+// The term k of a discrete Fourier transform of the first count values of x. sign: -1 for the
+// forward transform, 1 for the inverse, which divides by n.
 std::complex<double> sum_at(const signal &x, int count, int k, int sign) {
     const auto n = static_cast<int>(x.re.size());
     std::complex<double> sum = 0.0;
@@ -31,7 +31,7 @@ std::complex<double> sum_at(const signal &x, int count, int k, int sign) {
     return sign < 0 ? sum : sum / static_cast<double>(n);
 }
 
-// Checks that the first outputs values of y are the sums of the first inputs values of x.
+// Checks that the first outputs values of y are the transform of the first inputs values of x.
 void check_sums(const signal &y, int outputs, const signal &x, int inputs, int sign) {
     double norm = 0.0;
     for (size_t i = 0; i < x.re.size(); ++i) norm += std::fabs(x.re[i]) + std::fabs(x.im[i]);
@@ -51,7 +51,8 @@ void transform(fuzz::input *in) {
     const bool real = !fast && in->ConsumeBool();
     const auto size = static_cast<size_t>(n);
     const auto count = std::clamp(m, 0, n);
-    const signal given = {fuzz::exactly<double>(in, size), fuzz::exactly<double>(in, size)};
+    const signal given = {fuzz::padded_values<double>(in, size),
+                          fuzz::padded_values<double>(in, size)};
     signal x = given, y = given;
     if (real) std::fill(x.im.begin(), x.im.end(), 0.0);
     if (fast) {
@@ -63,12 +64,12 @@ void transform(fuzz::input *in) {
         tavo_fft_deinit(&fft);
         tavo_fft_deinit(&fft);
     } else {
-        must(tavo_dft(y.re.data(), y.im.data(), n, m, real) == 0, "a transform is done");
+        must(tavo_dft(y.re.data(), y.im.data(), n, m, real) == 0, "a transform succeeds");
     }
     check_sums(y, n, x, count, -1);
 
     y = given;
-    must(tavo_inverse_dft(y.re.data(), y.im.data(), n, m, real) == 0, "an inverse is done");
+    must(tavo_inverse_dft(y.re.data(), y.im.data(), n, m, real) == 0, "an inverse succeeds");
     check_sums(y, count, x, n, 1);
     for (auto i = static_cast<size_t>(count); i < size; ++i) {
         must(memcmp(&y.re[i], &given.re[i], 8) == 0 && memcmp(&y.im[i], &given.im[i], 8) == 0,
@@ -76,7 +77,7 @@ void transform(fuzz::input *in) {
     }
 }
 
-// Positions of the peaks, ascending.
+// Returns the positions of the peaks, ascending.
 template <typename T>
 std::vector<int64_t> peaks_of(const std::vector<T> &x) {
     std::vector<int64_t> peaks;
@@ -86,11 +87,12 @@ std::vector<int64_t> peaks_of(const std::vector<T> &x) {
     return peaks;
 }
 
-// Checks that out holds first what kept has, then peaks from the largest down, none at most reach
-// from one before it, until there are most or no more. Of equal peaks any may come first: out says.
+// Checks that out starts with the expected positions. Then come the peaks, largest first, except
+// those within radius of an earlier position; out has at most max_count entries. Equal peaks may be
+// in any order.
 template <typename T, typename Index>
-void check_peaks(const std::vector<T> &x, const std::vector<Index> &out, std::vector<int64_t> kept,
-                 int64_t reach, size_t most = SIZE_MAX) {
+void check_peaks(const std::vector<T> &x, const std::vector<Index> &out,
+                 std::vector<int64_t> expected, int64_t radius, size_t max_count = SIZE_MAX) {
     const auto value = [&x](int64_t at) { return x.at(static_cast<size_t>(at)); };
     const std::vector<int64_t> peaks = peaks_of(x);
     std::vector<int64_t> order(out.begin(), out.end());
@@ -98,32 +100,33 @@ void check_peaks(const std::vector<T> &x, const std::vector<Index> &out, std::ve
     std::stable_sort(order.begin(), order.end(),
                      [&](int64_t a, int64_t b) { return value(a) > value(b); });
     for (const int64_t at : order) {
-        const auto is_near = [&](int64_t other) { return std::abs(at - other) <= reach; };
+        const auto is_near = [&](int64_t other) { return std::abs(at - other) <= radius; };
         const bool is_peak = std::binary_search(peaks.begin(), peaks.end(), at);
-        const bool free = std::none_of(kept.begin(), kept.end(), is_near);
-        if (is_peak && free && kept.size() < most) kept.push_back(at);
+        const bool free = std::none_of(expected.begin(), expected.end(), is_near);
+        if (is_peak && free && expected.size() < max_count) expected.push_back(at);
     }
-    must(std::equal(out.begin(), out.end(), kept.begin(), kept.end()), "the peaks are found");
+    must(std::equal(out.begin(), out.end(), expected.begin(), expected.end()),
+         "the peaks are found");
 }
 
 uint32_t choose_distance(fuzz::input *in) {
     return in->ConsumeBool() ? in->ConsumeIntegral<uint8_t>() : in->ConsumeIntegral<uint32_t>();
 }
 
-void sorted_peaks(fuzz::input *in) {
+void find_sorted_peaks(fuzz::input *in) {
     const uint32_t distance = choose_distance(in);
-    const uint32_t most = in->ConsumeBool() ? in->ConsumeIntegral<uint8_t>() : 0;
-    const auto x = fuzz::values<float>(in, kMostValues);
-    const size_t room = most == 0 ? SIZE_MAX : most;
-    std::vector<uint32_t> out(std::min(room, x.size() / 2));
-    out.resize(static_cast<size_t>(
-        findsortedNPeaks(x.data(), static_cast<int64_t>(x.size()), distance, most, out.data())));
-    check_peaks(x, out, {}, distance, room);
+    const uint32_t max_count = in->ConsumeBool() ? in->ConsumeIntegral<uint8_t>() : 0;
+    const auto x = fuzz::values<float>(in, kMaxValues);
+    const size_t limit = max_count == 0 ? SIZE_MAX : max_count;
+    std::vector<uint32_t> out(std::min(limit, x.size() / 2));
+    out.resize(static_cast<size_t>(findsortedNPeaks(x.data(), static_cast<int64_t>(x.size()),
+                                                    distance, max_count, out.data())));
+    check_peaks(x, out, {}, distance, limit);
 }
 
-void spaced_peaks(fuzz::input *in) {
+void find_spaced_peaks(fuzz::input *in) {
     const uint32_t distance = choose_distance(in);
-    const auto x = fuzz::values<double>(in, kMostValues);
+    const auto x = fuzz::values<double>(in, kMaxValues);
     std::vector<int32_t> out(x.size() / 2);
     out.resize(static_cast<size_t>(
         findPeaks(x.data(), static_cast<int64_t>(x.size()), distance, out.data())));
@@ -133,11 +136,11 @@ void spaced_peaks(fuzz::input *in) {
     if (distance > 0) check_peaks(x, out, {}, int64_t{distance} - 1);
 }
 
-void priority_peaks(fuzz::input *in) {
+void find_priority_peaks(fuzz::input *in) {
     const auto distance = static_cast<int32_t>(choose_distance(in) & INT32_MAX);
     std::vector<int32_t> priority(in->ConsumeIntegralInRange<size_t>(0, 16));
     for (int32_t &position : priority) position = in->ConsumeIntegral<int16_t>();
-    const auto x = fuzz::values<double>(in, kMostValues);
+    const auto x = fuzz::values<double>(in, kMaxValues);
     std::vector<int32_t> out(priority.size() + x.size() / 2);
     const int32_t count =
         findPeaksPriority(x.data(), static_cast<int64_t>(x.size()), distance, out.data(),
@@ -146,7 +149,7 @@ void priority_peaks(fuzz::input *in) {
     if (count < 0) return;
     out.resize(static_cast<size_t>(count));
     const std::vector<int64_t> peaks = peaks_of(x);
-    std::vector<int64_t> pinned;  // the nearest to each position, but not the last
+    std::vector<int64_t> pinned;  // the nearest peak to each position, except the last peak
     for (const int32_t position : priority) {
         if (peaks.size() < 2) break;
         const int64_t nearest = *std::min_element(
@@ -157,7 +160,7 @@ void priority_peaks(fuzz::input *in) {
     check_peaks(x, out, pinned, int64_t{distance} - 1);
 }
 
-// The bits of the values, sorted.
+// Returns the bits of the values, sorted.
 std::vector<uint64_t> bits_of(const std::vector<double> &values) {
     std::vector<uint64_t> bits(values.size());
     if (!values.empty()) memcpy(bits.data(), values.data(), 8 * values.size());
@@ -167,28 +170,28 @@ std::vector<uint64_t> bits_of(const std::vector<double> &values) {
 
 void sort(fuzz::input *in) {
     const bool whole = in->ConsumeBool();
-    const auto given = fuzz::values<double>(in, kMostValues);
+    const auto given = fuzz::values<double>(in, kMaxValues);
     std::vector<double> x = given;
     const auto last = static_cast<int32_t>(x.size()) - 1;
     if (!whole && x.empty()) return;
-    const int32_t place = whole ? 0 : partition(0, last, x.data());
+    const int32_t pivot_at = whole ? 0 : partition(0, last, x.data());
     if (whole) quickSort(0, last, x.data());
     must(bits_of(x) == bits_of(given), "every value is kept");
     if (std::any_of(x.begin(), x.end(), [](double value) { return std::isnan(value); })) return;
     must(!whole || std::is_sorted(x.begin(), x.end()), "values ascend after a sort");
-    must(place >= 0 && place <= std::max(last, 0), "the place lies among the values");
-    const auto pivot = x.begin() + place;
+    must(pivot_at >= 0 && pivot_at <= std::max(last, 0), "the pivot is among the values");
+    const auto pivot = x.begin() + pivot_at;
     const auto small = [&](double value) { return value <= *pivot; };
     must(whole || (std::all_of(x.begin(), pivot, small) && std::none_of(pivot + 1, x.end(), small)),
-         "both parts keep to their side");
+         "the pivot separates the values");
 }
 
 void multiply(fuzz::input *in) {
     size_t size[3];  // rows, columns, inner
     for (size_t &each : size) each = in->ConsumeIntegralInRange<size_t>(0, 9);
     const auto [rows, columns, inner] = size;
-    auto a = fuzz::exactly<float>(in, rows * inner);
-    auto b = fuzz::exactly<float>(in, inner * columns);
+    auto a = fuzz::padded_values<float>(in, rows * inner);
+    auto b = fuzz::padded_values<float>(in, inner * columns);
     std::vector<double> d(rows * columns, -1.0);
     float *a_rows[10], *b_rows[10];
     double *d_rows[10];
@@ -211,7 +214,8 @@ void multiply(fuzz::input *in) {
 }  // namespace
 
 int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    fuzz::run_one({transform, sorted_peaks, spaced_peaks, priority_peaks, sort, multiply}, data,
-                  size);
+    fuzz::run_one(
+        {transform, find_sorted_peaks, find_spaced_peaks, find_priority_peaks, sort, multiply},
+        data, size);
     return 0;
 }

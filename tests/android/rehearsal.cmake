@@ -1,5 +1,5 @@
-# Builds as the NDK's toolchain file would, with the log and the codec library of this build in the
-# device's place, and looks at what came out.
+# Builds as with the NDK's toolchain file, with the log and the codec library of this build instead of the device's,
+# and checks the result.
 # -DSOURCE=... -DDIRECTORY=... -DLIBRARIES=directory of liblog.so and libwexaaudio.so
 file(REMOVE_RECURSE ${DIRECTORY})
 set(configure ${CMAKE_COMMAND} -S ${SOURCE} -B ${DIRECTORY} -G Ninja -DCMAKE_BUILD_TYPE=Release

@@ -1,4 +1,4 @@
-// A beat analysis set up by hand, and signals for it.
+// A beat analysis with a given signal, and signals for it.
 #ifndef TAVO_TESTS_BEAT_BEAT_FIXTURE_H
 #define TAVO_TESTS_BEAT_BEAT_FIXTURE_H
 
@@ -13,7 +13,7 @@
 
 constexpr double kHop = 256.0 / 11025.0;  // seconds
 
-// An instance whose analysis signal is filled, in state 2 as inside a job. No click track.
+// An instance with an analysis signal, in state 2 as inside a job. It writes no click track.
 struct analysis {
     TAVO_CTX ctx = {};
     std::vector<double> ana;
@@ -28,20 +28,20 @@ struct analysis {
         ctx.onset = static_cast<TAVO_ONSET_CTX *>(calloc(1, sizeof(TAVO_ONSET_CTX)));
         ctx.onset->frame_size = size;
         ctx.onset->hop_size = hop;
-        ctx.onset->bpm = -7;  // not touched yet
+        ctx.onset->bpm = -7;  // must be overwritten
     }
     analysis(const analysis &) = delete;
     ~analysis() { clearOnsetCtx(ctx.onset); }
 };
 
-// The working context of a silent signal of exactly that many frames, with the lock and condition.
+// The context of a silent signal of exactly that many analysis frames, with the lock and condition.
 struct working_context {
-    analysis of;
+    analysis signal;
     TAVO_BEAT_CTX beat = {};
 
     explicit working_context(int64_t frames, int32_t size = 512, int32_t hop = 256)
-        : of(std::vector<double>(static_cast<size_t>(hop * (frames - 1) + size)), size, hop) {
-        __beat_init(&of.ctx, &beat);
+        : signal(std::vector<double>(static_cast<size_t>(hop * (frames - 1) + size)), size, hop) {
+        __beat_init(&signal.ctx, &beat);
     }
     ~working_context() { __tavo_deinit(&beat); }
 };
@@ -50,9 +50,9 @@ inline double uniform(std::mt19937 *random) {
     return static_cast<double>((*random)()) / 2147483648.0 - 1.0;
 }
 
-// Samples from -1 to 1; or of any size up to 2^highest; or mostly zeros; or zeros of both signs; or
-// denormal numbers.
-inline std::vector<double> wild_samples(size_t n, int highest, std::mt19937 *random) {
+// Random samples of one of five kinds: from -1 to 1; of any size up to 2^highest; mostly zeros;
+// denormal numbers; zeros of both signs.
+inline std::vector<double> extreme_samples(size_t n, int highest, std::mt19937 *random) {
     std::vector<double> samples(n);
     const auto kind = (*random)() % 5;
     for (double &x : samples) {

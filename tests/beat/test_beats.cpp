@@ -1,4 +1,4 @@
-// Whole analyses of songs made of known beats, and the click track.
+// Whole analyses of songs with known beats, and the click track.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -15,10 +15,10 @@ namespace {
 
 using namespace std::string_literals;
 
-int starts_until_stop = 0;  // thread starts until a stop arrives
+int starts_until_stop = 0;  // number of thread starts until a stop arrives
 int32_t *stop_flag = nullptr;
 
-// Drums from 0 s on, each heard until the next, no two neighbours equally loud.
+// Drum hits from 0 s on, each audible until the next; neighbours differ in loudness.
 std::vector<double> drum_song(double bpm, double seconds) {
     std::vector<double> song(static_cast<size_t>(seconds * kAnalysisRate));
     std::mt19937 random(4);
@@ -30,11 +30,11 @@ std::vector<double> drum_song(double bpm, double seconds) {
     return song;
 }
 
-// Returns the click track file of an analysis, empty if there is no file.
-std::string analyse_to_file(analysis *of) {
+// Runs the analysis and returns its click track file, or an empty string.
+std::string analyse_to_file(analysis *run) {
     const support::temporary_file file("click");
     fnamedec = file.path.c_str();
-    getBeatPosition(&of->ctx);
+    getBeatPosition(&run->ctx);
     fnamedec = "";
     return support::contents_of(file.path);
 }
@@ -49,95 +49,68 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 }  // namespace
 
-// Quiet noise, then loud: the onset between them is the one beat requested, although much sharper
-// onsets out of silence follow.
-TEST(Beats, APowerRiseForcesABeat) {
+// Quiet noise, then loud noise. The onset between them is the one beat, although much sharper
+// onsets after silence follow.
+TEST(Beats, PowerRiseForcesABeat) {
     std::mt19937 random(9);
     std::vector<double> song(90 * 11025);
     for (size_t i = 0; i < song.size(); ++i) {
         const bool silent = i % 5512 > 3000 && i % 5512 < 3700;
         song[i] = (i < 50 * 11025 ? 2000.0 : silent ? 0.0 : 16000.0) * uniform(&random);
     }
-    analysis of(song);
-    EXPECT_GT(getBeatPosition(&of.ctx), 1);
-    of.ctx.onset->max_beats = 1;
-    ASSERT_EQ(getBeatPosition(&of.ctx), 1);
-    EXPECT_NEAR(of.ctx.onset->beat_times[0], 50000.0, 100.0);
+    analysis run(song);
+    EXPECT_GT(getBeatPosition(&run.ctx), 1);
+    run.ctx.onset->max_beats = 1;
+    ASSERT_EQ(getBeatPosition(&run.ctx), 1);
+    EXPECT_NEAR(run.ctx.onset->beat_times[0], 50000.0, 100.0);
 }
 
-// The envelope has four threads. A stop before them leaves the tempo as it was, one that arrives
-// with the first is seen after the tempo, and one with the threshold's threads is too late.
-TEST(Beats, StopIsSeenBeforeTheEnvelopeAndAfterTheTempo) {
+// The envelope uses four threads. A stop before the first one leaves the tempo unset. A stop at the
+// first one is noticed after the tempo was set. A stop at the threads of the threshold is too late.
+TEST(Beats, StopIsCheckedBeforeTheEnvelopeAndAfterTheTempo) {
     for (const auto &[start, tempo, beats] :
          {std::tuple{0, false, false}, {1, true, false}, {5, true, true}}) {
-        analysis of(drum_song(120, 10));
-        stop_flag = &of.ctx.quit;
-        of.ctx.quit = start == 0 ? 1 : 0;
+        analysis run(drum_song(120, 10));
+        stop_flag = &run.ctx.quit;
+        run.ctx.quit = start == 0 ? 1 : 0;
         starts_until_stop = start;
         fault::arm({fault::kThread, INT64_MAX, false, EIO, [] {
                         if (--starts_until_stop == 0) store_flag(stop_flag, 1);
                     }});
-        EXPECT_EQ(analyse_to_file(&of).empty(), !beats) << start;
-        EXPECT_EQ(of.ctx.onset->beat_count > 3, beats) << start;
-        EXPECT_EQ(of.ctx.onset->bpm > 0, tempo) << start;
-        EXPECT_EQ(of.ctx.state, beats ? kStateFinished : kStateRunning) << start;
+        EXPECT_EQ(analyse_to_file(&run).empty(), !beats) << start;
+        EXPECT_EQ(run.ctx.onset->beat_count > 3, beats) << start;
+        EXPECT_EQ(run.ctx.onset->bpm > 0, tempo) << start;
+        EXPECT_EQ(run.ctx.state, beats ? kStateFinished : kStateRunning) << start;
         EXPECT_EQ(feat_mutex_mt, nullptr);
     }
-    analysis of(drum_song(120, 10));
+    analysis run(drum_song(120, 10));
     fault::arm({fault::kMemory, 0});
-    EXPECT_EQ(getBeatPosition(&of.ctx), 0);
+    EXPECT_EQ(getBeatPosition(&run.ctx), 0);
     fault::disarm();
 }
 
-// Every worker starts, in order, even if its range is empty.
-TEST(Beats, EightWorkersStartWhateverTheLength) {
-    struct start {
-        void *(*entry)(void *);
-        int32_t id;  // first field of both workers' records
-    };
-    static std::vector<start> starts;
-    for (const size_t n : {0u, 1u, 255u, 256u, 257u, 511u, 512u, 767u, 768u, 1024u, 11025u}) {
-        std::mt19937 random(3);
-        analysis of(wild_samples(n, 0, &random));
-        starts.clear();
-        fault::plan plan;
-        plan.thread_watch = [](void *(*entry)(void *), void *record) {
-            starts.push_back({entry, *static_cast<const int32_t *>(record)});
-        };
-        fault::arm(plan);
-        getBeatPosition(&of.ctx);
-        fault::disarm();
-        ASSERT_EQ(starts.size(), 8u) << n;
-        for (int32_t i = 0; i < 8; ++i) {
-            EXPECT_EQ(starts[static_cast<size_t>(i)].entry,
-                      i < 4 ? _tavo_proc_onsetenv : _tavo_proc_beatcandi);
-            EXPECT_EQ(starts[static_cast<size_t>(i)].id, i % 4) << n;
-        }
-    }
-}
-
-// Silence and signals too short for an envelope have 90 BPM and no beats. The file has half the
-// signal, to which the blips come with a gain of 1.25; 1001 and -1001 halve towards zero.
-TEST(Beats, FileHoldsHalfTheSignalAndTheBlips) {
+// Silence and signals too short for an envelope have 90 BPM and no beats. The file contains half of
+// the signal plus the blips with a gain of 1.25; 1001 and -1001 are halved toward zero.
+TEST(Beats, FileContainsHalfTheSignalAndTheBlips) {
     for (const size_t n : {0u, 1u, 511u, 512u, 767u, 11025u, 132300u}) {
         std::vector<double> signal(n, n < 768 ? 1001.0 : 0.0);
         if (n > 1) signal[1] = -signal[0];
         if (n > 11025) signal = drum_song(120, 12);
-        analysis of(signal);
-        const std::string file = analyse_to_file(&of);
-        const TAVO_ONSET_CTX *onset = of.ctx.onset;
+        analysis run(signal);
+        const std::string file = analyse_to_file(&run);
+        const TAVO_ONSET_CTX *onset = run.ctx.onset;
         EXPECT_EQ(onset->bpm == 90 && onset->beat_times == nullptr, n <= 11025) << n;
-        EXPECT_NEAR(onset->bpm, n > 11025 ? 120 : 90, 3);  // of whole frames, 123 or 117
-        EXPECT_EQ(of.ctx.state, kStateFinished) << n;
+        EXPECT_NEAR(onset->bpm, n > 11025 ? 120 : 90, 3);  // whole hops allow 123 or 117
+        EXPECT_EQ(run.ctx.state, kStateFinished) << n;
         ASSERT_EQ(file.size(), 44 + 2 * n);
-        if (n == 512) {  // 1060 bytes; PCM, mono, 11025 Hz, 22050 bytes a second; 1024 bytes
+        if (n == 512) {  // RIFF size 1060; PCM, mono, 11025 Hz, 22050 bytes/s; 1024 bytes of data
             EXPECT_EQ(file.substr(0, 44),
                       "RIFF\x24\4\0\0WAVEfmt \x10\0\0\0\1\0\1\0\x11\x2B\0\0"
                       "\x22\x56\0\0\2\0\x10\0"
                       "data\0\4\0\0"s);
         }
         std::vector<float> track(n);
-        makeBlipTrack(onset->beat_times, onset->beat_count, 11025, of.ctx.ana_len, track.data());
+        makeBlipTrack(onset->beat_times, onset->beat_count, 11025, run.ctx.ana_len, track.data());
         std::vector<int16_t> samples(n);
         file.copy(reinterpret_cast<char *>(samples.data()), 2 * n, 44);
         for (size_t i = 0; i < n; ++i) {
@@ -145,7 +118,7 @@ TEST(Beats, FileHoldsHalfTheSignalAndTheBlips) {
             ASSERT_NEAR(samples[i], signal[i] / 2 + 1.25 * 32767.0 * track[i], 1.0) << i;
         }
         fnamedec = n % 2 == 0 ? "/nowhere/at/all.wav" : nullptr;
-        EXPECT_EQ(getBeatPosition(&of.ctx) > 2, n > 11025);
+        EXPECT_EQ(getBeatPosition(&run.ctx) > 2, n > 11025);
     }
     EXPECT_EQ(getBeatPosition(nullptr), 0);
     clearOnsetCtx(nullptr);
@@ -162,16 +135,16 @@ TEST(ClickTrack, BlipIsADecayingTone) {
     EXPECT_EQ(std::count(track.begin() + 11025 + kBlip, track.end(), 0.0f), 20000 - 11025 - 1102);
 }
 
-// 100 ms are 1102.5 samples, which round to 1103; 150 ms are 1653.75. A blip cut short ends one
-// sample before the end. -0.1 ms and the half that rounds are -0.6 of a sample, truncated to 0.
+// 100 ms is 1102.5 samples, rounded to 1103; 150 ms is 1653.75. A blip that does not fit ends one
+// sample before the end. -0.1 ms is -1.1 samples, plus the half for rounding -0.6, truncated to 0.
 TEST(ClickTrack, BlipsAreCutAtTheEnd) {
-    struct piece {
-        size_t at, length;  // of the blip, from its start on
+    struct part {
+        size_t at, length;  // of the blip
     };
     const struct {
         std::vector<float> beats;
         int64_t n;
-        std::vector<piece> pieces;
+        std::vector<part> parts;
     } cases[] = {{{100}, 1103 + kBlip, {{1103, kBlip}}},
                  {{100}, 1102 + kBlip, {{1103, kBlip - 2}}},
                  {{100}, 1105, {{1103, 1}}},
@@ -185,7 +158,7 @@ TEST(ClickTrack, BlipsAreCutAtTheEnd) {
     const std::vector<float> blip = track_of({0.0f}, 2000);
     for (const auto &c : cases) {
         std::vector<float> expected(static_cast<size_t>(c.n));
-        for (const piece &p : c.pieces) {
+        for (const part &p : c.parts) {
             std::copy_n(blip.begin(), p.length, expected.begin() + static_cast<long>(p.at));
         }
         EXPECT_EQ(track_of(c.beats, c.n), expected) << c.beats[0] << " ms in " << c.n;

@@ -10,8 +10,8 @@
 
 namespace {
 
-// Bit-identical, or both NaN.
-bool same_bits(const double *a, const std::vector<double> &b) {
+// True if bit-identical or both NaN.
+bool is_bit_identical(const double *a, const std::vector<double> &b) {
     for (size_t i = 0; i < b.size(); ++i) {
         if (std::isnan(b[i]) ? !std::isnan(a[i]) : memcmp(&a[i], &b[i], sizeof b[i]) != 0)
             return false;
@@ -19,7 +19,7 @@ bool same_bits(const double *a, const std::vector<double> &b) {
     return true;
 }
 
-// A frame by the exported functions of the toolkit.
+// Computes one analysis frame with the exported functions of dsp/.
 struct plain_frame {
     TAVO_FFT_CTX fft = {};
     std::vector<double> window;
@@ -53,7 +53,7 @@ struct plain_frame {
     }
 };
 
-// Frames in steps of hop.
+// The onset envelope, one analysis frame after the other.
 std::vector<double> envelope(const TAVO_BEAT_CTX &beat, int32_t size, int32_t hop) {
     const plain_frame frame(size);
     std::vector<double> change, next, now = frame.decibels(beat.signal, beat.mel_matrix);
@@ -72,19 +72,19 @@ std::vector<double> envelope(const TAVO_BEAT_CTX &beat, int32_t size, int32_t ho
 
 }  // namespace
 
-TEST(BeatCtx, OfOneSecondHas42Frames) {
-    analysis of(std::vector<double>(11025));
-    of.ana[3] = -32768.0;
-    of.ana[11024] = 16383.5;
+TEST(BeatCtx, OneSecondHas42Frames) {
+    analysis run(std::vector<double>(11025));
+    run.ana[3] = -32768.0;
+    run.ana[11024] = 16383.5;
     TAVO_BEAT_CTX beat = {};
-    __beat_init(&of.ctx, &beat);
+    __beat_init(&run.ctx, &beat);
     EXPECT_EQ(beat.frame_count, 42);  // (11025 - 512) / 256 + 1
     EXPECT_EQ(beat.frame_times[41], 0.02321995465f * 42.0f);
     EXPECT_EQ(beat.signal[3], -32768.0 / 32767.0);
     EXPECT_EQ(beat.signal[11024], 0.5);
     EXPECT_EQ(std::count(beat.rise_flags, beat.rise_flags + 11025, 0), 11025);
-    // 39.817379 mel in 37 steps of 71.743 Hz below 1 kHz; bins 21.533 Hz apart; a top of 2 /
-    // 143.486.
+    // 39.817379 mel in 37 steps, each 71.743 Hz below 1 kHz. Bins are 21.533 Hz apart. The
+    // triangle's height is 2 / 143.486.
     const float lowest[] = {0.0f,       0.0041836f, 0.0083671f, 0.0125507f,
                             0.0111427f, 0.0069591f, 0.0027756f, 0.0f};
     for (int bin = 0; bin < 8; ++bin) EXPECT_NEAR(beat.mel_matrix[bin][0], lowest[bin], 1e-6);
@@ -93,9 +93,10 @@ TEST(BeatCtx, OfOneSecondHas42Frames) {
     EXPECT_TRUE(feat_mutex_mt == nullptr && feat_cond_mt == nullptr);
 }
 
-// Ranges of any number of frames; all sizes, which the arguments give, not the context; silence,
-// samples and weights that are not finite; weights of either sign and zero.
-TEST(OnsetEnvelope, EqualsTheFramesOneByOne) {
+// Each worker computes a range of any number of frames. All sizes come from the arguments, not from
+// the context. The input includes silence, non-finite samples and weights, and weights that are
+// negative or zero.
+TEST(OnsetEnvelope, EqualsTheFramesComputedOneByOne) {
     std::mt19937 random(6);
     const auto below = [&](uint32_t limit) { return static_cast<int32_t>(random() % limit); };
     for (int round = 0; round < 200; ++round) {
@@ -104,8 +105,8 @@ TEST(OnsetEnvelope, EqualsTheFramesOneByOne) {
         const int32_t hop = round % 3 == 0 ? 1 + below(700) : 256;
         working_context work(2 + below(45), size, hop);
         TAVO_BEAT_CTX *beat = &work.beat;
-        const size_t n = work.of.ana.size();
-        const std::vector<double> samples = wild_samples(n, 20 << round % 6, &random);
+        const size_t n = work.signal.ana.size();
+        const std::vector<double> samples = extreme_samples(n, 20 << round % 6, &random);
         std::copy(samples.begin(), samples.end(), beat->signal);
         if (round % 5 == 1) beat->signal[random() % n] = round % 2 == 0 ? NAN : INFINITY;
         if (round % 8 == 2) {  // an infinite weight of a power that is zero at first
@@ -116,60 +117,8 @@ TEST(OnsetEnvelope, EqualsTheFramesOneByOne) {
             beat->mel_matrix[i / 18][below(36)] = static_cast<float>(below(3) - 1);
         beat->half_frame = beat->band_count = 0;
         _getOnsetEnvelope(beat, size, hop);
-        beat->half_frame = size / 2;  // rows to release
-        EXPECT_TRUE(same_bits(beat->onset_env, envelope(*beat, size, hop)));
+        beat->half_frame = size / 2;  // number of rows to release
+        EXPECT_TRUE(is_bit_identical(beat->onset_env, envelope(*beat, size, hop)));
         EXPECT_EQ(beat->onset_env[beat->frame_count - 1], 0.0);
-    }
-}
-
-// A worker of the caller's own, with rows of the caller's own. Without a window, a tone of a whole
-// number of periods leaves rounding errors alone in all other bins: powers, which are rounded to
-// single precision, hide them elsewhere.
-TEST(OnsetWorker, FillsItsOwnRowsAsFramesOneByOne) {
-    std::mt19937 random(5);
-    plain_frame frame(512);
-    const working_context work(2);
-    for (int round = 0; round < 400; ++round) {
-        frame.window.assign(512, 1.0);
-        std::vector<double> samples = wild_samples(2000, 50, &random);
-        for (size_t i = 0; i < samples.size() && round % 2 == 0; ++i)
-            samples[i] = cos(6.283185307179586 / 512 * static_cast<double>(i) * (round % 100));
-        float spectrum[6][256] = {}, *spectrum_rows[6];
-        double mel[6][36] = {}, *mel_rows[6];
-        for (size_t k = 0; k < 6; ++k) {
-            spectrum_rows[k] = spectrum[k];
-            mel_rows[k] = mel[k];
-        }
-        int32_t done[4] = {1, 1, 0, 1};
-        TAVO_ONSET_WORKER worker = {};
-        worker.id = 2;
-        worker.signal = samples.data();
-        worker.first = round % 3;
-        worker.last = round % 5 - 1;
-        worker.spectrum = spectrum_rows;
-        worker.frame_size = 512;
-        worker.hop_size = 1 + static_cast<int32_t>(random() % 299);
-        worker.fft = &frame.fft;
-        worker.done_flags = done;
-        worker.thread_count = 4;
-        worker.mutex = feat_mutex_mt;
-        worker.cond = feat_cond_mt;
-        worker.band_count = 36;
-        worker.mel_matrix = work.beat.mel_matrix;
-        worker.mel = mel_rows;
-        worker.window = frame.window.data();
-        ASSERT_EQ(pthread_create(&worker.thread, nullptr, _tavo_proc_onsetenv, &worker), 0);
-        pthread_join(worker.thread, nullptr);
-        EXPECT_EQ(done[2], 1);
-        for (int64_t k = 0; k < 6; ++k) {
-            const double *first = samples.data() + k * worker.hop_size;
-            const bool own = k >= worker.first && k <= worker.last;
-            std::vector<float> power(256);
-            std::vector<double> row(36);
-            if (own) power = frame.powers(first);
-            if (own) row = frame.decibels(first, worker.mel_matrix);
-            ASSERT_EQ(memcmp(spectrum[k], power.data(), sizeof spectrum[k]), 0) << round;
-            ASSERT_TRUE(same_bits(mel[k], row)) << round;
-        }
     }
 }

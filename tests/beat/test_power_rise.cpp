@@ -9,25 +9,25 @@ namespace {
 
 constexpr size_t kBlock = 5512;
 
-// Constant samples of this level, 16-bit scale.
+// A constant sample that has this level on the 16-bit scale.
 double sample_of_level(double level) {
     return sqrt((level + 0.5) / 32767.0);
 }
 
-// Every sample's level by itself, dB; at a block's last sample, the largest of the block. block:
-// the same for each half second, -150 where none was measured.
+// Computes the level of each sample in dB; the last sample of a block has the block's largest
+// level. *block receives the largest level of each half second, -150 without a measured sample.
 std::vector<double> plain_levels(const std::vector<double> &signal, std::vector<double> *block) {
     std::vector<double> db(signal.size(), -150.0);
     block->assign(signal.size() / kBlock + 1, -150.0);
-    int32_t held = 0;
+    int32_t decayed = 0;
     double loudest = -150.0;
     for (size_t i = 5; i + 5 <= signal.size(); ++i) {
         double sum = 0.0;
         for (size_t k = i - 5; k < i + 5; ++k) sum += signal[k] * signal[k];
         const double mean = sum / 10.0 * 32767.0;
         const int32_t value = mean > 0.0 ? static_cast<int32_t>(std::min(mean, 32767.0)) : 0;
-        const int32_t level = std::max(value, held);
-        held = level - level / 1000;
+        const int32_t level = std::max(value, decayed);
+        decayed = level - level / 1000;
         db[i] = 20.0 * std::log10(std::max(level, 1000) / 32767.0);
         loudest = std::max(loudest, db[i]);
         if (i % kBlock != 0) continue;
@@ -60,12 +60,12 @@ std::vector<int32_t> plain_rises(const std::vector<double> &signal) {
         while (i <= kBlock * b && !(db[i] >= target)) ++i;
         if (i > kBlock * b) continue;
         flags[i] = 1;
-        b += 6;  // and the loop's own step
+        b += 6;  // the loop adds one more
     }
     return flags;
 }
 
-// Noise whose loudness changes about once in two seconds, of n samples.
+// n samples of noise, whose loudness changes about every two seconds.
 std::vector<double> changing_noise(size_t n, std::mt19937 *random) {
     std::vector<double> signal(n);
     double loudness = 0.1;
@@ -78,27 +78,30 @@ std::vector<double> changing_noise(size_t n, std::mt19937 *random) {
 
 }  // namespace
 
-// Silence is at the floor of -30.31 dB, sample 0.5 at level 8191, -12.04 dB. P60 is -12.04, the
-// target twice that, level 2048: three of the ten samples around i, each 819 of the mean, must be
-// loud. 20 blocks are measured, block b over samples 5512 (b - 1) + 1 to 5512 b.
-TEST(PowerRise, IsAtTheFirstSampleAboveTheTarget) {
+// Silence is at the floor, -30.31 dB. A sample of 0.5 has level 8191, -12.04 dB. P60 is -12.04 dB
+// and the target twice that, level 2048: three of the ten samples around i must be loud, each
+// adding 819 to the mean. 20 blocks are measured; block b consists of the samples 5512 (b - 1) + 1
+// to 5512 b.
+TEST(PowerRise, StartsAtTheFirstSampleAboveTheTarget) {
     constexpr size_t kBegin = 10 * kBlock;
     const struct {
         size_t start;
         double sample;
-        size_t rise;  // 0: none
+        size_t rise;  // sample of the rise, or 0
     } cases[] = {
         {kBegin + 2000, 0.5, kBegin + 1998},
         {kBegin + 3, 0.5, kBegin + 1},
         {kBlock + 2000, 0.5, kBlock + 1998},  // block 0 is never measured and counts as quiet
-        // Levels below 1000 count as the floor. A step to -28.03 dB (level 1300) is too low, its
-        // limit being -32.03; one to -24.29 dB (2000) is not, and its target is below the floor.
+        // Levels below 1000 count as the floor. A step to -28.03 dB (level 1300) is too low,
+        // because the limit is -32.03 dB. A step to -24.29 dB (2000) is not, and its target is
+        // below the floor.
         {kBegin + 2000, sample_of_level(1300), 0},
         {kBegin + 2000, sample_of_level(2000), kBegin},
-        // Ten samples of -32768 have a mean of 32769, beyond 16 bits. The target is the top, 0 dB,
-        // which only ten loud samples reach.
+        // Ten samples of -32768 have a mean of 32769, which exceeds 16 bits. The target is 0 dB,
+        // which requires ten loud samples.
         {kBegin + 2000, -32768.0 / 32767.0, kBegin + 2005},
-        {kBegin + kBlock - 5, -32768.0 / 32767.0, kBegin + kBlock},  // at the block's last sample
+        {kBegin + kBlock - 5, -32768.0 / 32767.0,
+         kBegin + kBlock},  // at the last sample of a block
     };
     for (const auto &c : cases) {
         std::vector<double> signal(20 * kBlock + 100, c.sample);
@@ -112,18 +115,18 @@ TEST(PowerRise, IsAtTheFirstSampleAboveTheTarget) {
     }
 }
 
-// All lengths around a whole block; noise, wild values, NaN and infinities, and samples whose means
-// are whole levels, so that a single rounding decides.
-TEST(PowerRise, EqualsTheLevelsSampleBySample) {
+// Lengths around a whole block; noise, extreme values, NaN and infinities; and samples whose means
+// are whole levels, so that a single rounding matters.
+TEST(PowerRise, EqualsThePlainSearch) {
     std::mt19937 random(7);
     int found = 0;
     for (int round = 0; round < 80; ++round) {
         const size_t n = (random() % 50) * kBlock + random() % (round % 2 == 0 ? 12 : kBlock);
         std::vector<double> signal =
-            round % 4 == 0 ? wild_samples(n, 20, &random) : changing_noise(n, &random);
+            round % 4 == 0 ? extreme_samples(n, 20, &random) : changing_noise(n, &random);
         for (double &x : signal)
             if (round % 4 == 1) x = sqrt(floor(3276.7 * fabs(x)) * 10.0 / 32767.0);
-        if (round % 8 == 3 && n > 0) signal[0] = 4.0;  // in the first sum alone
+        if (round % 8 == 3 && n > 0) signal[0] = 4.0;  // only in the first sum
         if (round % 6 == 0 && n > 0) signal[random() % n] = round % 4 == 0 ? NAN : INFINITY;
         std::vector<int32_t> flags(n);
         found += detectPowerVariation(signal.data(), flags.data(), static_cast<int64_t>(n));

@@ -12,7 +12,7 @@ struct pulse_pair {
     double weight;
 };
 
-int32_t tempo_of(std::vector<double> env, const std::vector<pulse_pair> &pairs = {}) {
+int32_t estimate(std::vector<double> env, const std::vector<pulse_pair> &pairs = {}) {
     for (const pulse_pair &pair : pairs) {
         env[pair.first] = 1.0;
         env[pair.first + pair.lag] = pair.weight;
@@ -26,33 +26,34 @@ int32_t tempo_of(std::vector<double> env, const std::vector<pulse_pair> &pairs =
 
 }  // namespace
 
-// Pairs far from each other correlate at their lags alone. The prior weighs them:
-//     lag  13     20     27     39     40     41     42     59     60     61     81
-//          0.767  0.994  0.948  0.693  0.671  0.650  0.629  0.347  0.335  0.324  0.161
-// 2583.984375 frames a minute over the lag is the tempo: 129 BPM for 20, 95 for 27.
-TEST(Tempo, HasTheBestScoreOfTwoAndThreePeriods) {
+// Distant pairs correlate only at their own lags. The weights of the lags are:
+// lag  13     20     27     39     40     41     42     59     60     61     81
+// 0.767  0.994  0.948  0.693  0.671  0.650  0.629  0.347  0.335  0.324  0.161
+// The tempo is 2583.984375 frames per minute divided by the lag: 129 BPM for 20, 95 for 27.
+TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     const struct {
         std::vector<std::pair<size_t, double>> weights;  // of each lag
         int32_t bpm;
     } cases[] = {
         {{{13, 1}}, 198},
         {{{12, 1}}, 90},            // 215 BPM is discarded
-        {{{18, 1}, {26, 1}}, 143},  // 0.967 and 0.964: on either side of 120 BPM
+        {{{18, 1}, {26, 1}}, 143},  // 0.967 and 0.964, on either side of 120 BPM
         {{{18, 1}, {26, 1.01}}, 99},
-        // 20 and its double have 0.994 + 0.5 x 0.671 = 1.330, or its double's neighbours 0.25 x
-        // 1.342; 27 has 1.313 or 1.346, 1.300 or 1.360.
+        // 20 and its double have 0.994 + 0.5 x 0.671 = 1.330, or with the double's neighbours 0.25
+        // x 1.342. 27 has 1.313 or 1.346, 1.300 or 1.360.
         {{{20, 1}, {40, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {40, 1}, {27, 1.42}}, 95},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.371}}, 129},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.434}}, 95},
-        // With its triple and the triple's neighbours 0.33 x 1.006; 27 has 1.313 or 1.340.
+        // With its triple and the triple's neighbours 20 has 0.33 x 1.006 more. 27 has 1.313 or
+        // 1.340.
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.413}}, 95},
-        {{{20, 1}, {59, 1}, {27, 1.1}}, 129},  // 59 alone: 1.109 and 1.043
-        // The share of 20 against its double, 0.533 or 0.527; the double has 64 BPM.
+        {{{20, 1}, {59, 1}, {27, 1.1}}, 129},  // only 59: 1.109 and 1.043
+        // The part of 20 in the sum of 20 and its double is 0.533 or 0.527. The double has 64 BPM.
         {{{20, 1}, {40, 1.30}}, 129},
         {{{20, 1}, {40, 1.33}}, 64},
-        // The longest lags: 42 against 27 with 0.45, and 81 as the triple of 27, whose share is
+        // The longest lags: 42 against 27 with 0.45, and 81 as the triple of 27, whose part is
         // 0.51.
         {{{42, 1}, {27, 0.475}}, 61},
         {{{27, 1}, {81, 5.6}}, 31},
@@ -61,37 +62,39 @@ TEST(Tempo, HasTheBestScoreOfTwoAndThreePeriods) {
         std::vector<pulse_pair> pairs;
         for (const auto &[lag, weight] : c.weights)
             pairs.push_back({100 + 200 * pairs.size(), lag, weight});
-        EXPECT_EQ(tempo_of(std::vector<double>(2584), pairs), c.bpm) << c.weights.back().second;
+        EXPECT_EQ(estimate(std::vector<double>(2584), pairs), c.bpm) << c.weights.back().second;
     }
 }
 
-// The last minute, or the second one of a song of more than two minutes: frames 2583 to 5166
-// of 7750, 416 to 2999 of 3000. A pair in it, 20 frames apart, outweighs the other.
+// The excerpt is the last minute, or the second minute of a song longer than two minutes: frames
+// 2583 to 5166 of 7750, or 416 to 2999 of 3000. A pair inside it, 20 frames apart, outweighs the
+// other.
 TEST(Tempo, DependsOnOneMinuteOnly) {
     const std::tuple<size_t, size_t, int32_t> cases[] = {{7750, 2583, 129}, {7750, 2582, 95},
                                                          {7750, 5146, 129}, {7750, 5147, 95},
                                                          {3000, 416, 129},  {3000, 415, 95}};
     for (const auto &[length, first, bpm] : cases) {
         const std::vector<double> silence(length);
-        EXPECT_EQ(tempo_of(silence, {{2900, 27, 0.5}, {first, 20, 1.0}}), bpm) << first;
+        EXPECT_EQ(estimate(silence, {{2900, 27, 0.5}, {first, 20, 1.0}}), bpm) << first;
     }
 }
 
-// Pulses every p frames correlate at p and 2p nearly the same, so the prior decides: p up to about
-// 144 BPM, else 2p. No period, as in silence, is 90 BPM, and above every tempo to calc_bpm_acf.
-TEST(Tempo, ShortExcerptsAndSilence) {
+// Pulses every p frames correlate almost equally at p and 2p, so the weighting decides: p up to
+// about 144 BPM, otherwise 2p. Without a period, as in silence, the tempo is 90 BPM, and
+// calc_bpm_acf returns a value above every tempo.
+TEST(Tempo, ShortExcerptsAndSilenceHaveATempo) {
     for (const auto &[length, period, bpm] :
          {std::tuple{1290u, 20u, 129},  // half a minute
-          {42u, 20u, 129},              // a second: more lags than the transform has values
-          {10u, 4u, 80}}) {             // the circle of 16 correlates best; 161 BPM, so 32 frames
+          {42u, 20u, 129},              // one second: more lags than the transform has values
+          {10u, 4u, 80}}) {  // best in the circular correlation of 16 values; 161 BPM, so 32 frames
         std::vector<double> env(length);
         for (size_t i = 0; i < length; i += period) env[i] = 1.0;
-        EXPECT_EQ(tempo_of(env), bpm) << length << " frames, period " << period;
+        EXPECT_EQ(estimate(env), bpm) << length << " frames, period " << period;
     }
-    for (const double odd_one : {0.0, double{NAN}, double{INFINITY}}) {
+    for (const double value : {0.0, double{NAN}, double{INFINITY}}) {
         std::vector<double> env(64);
-        env[5] = odd_one;
-        EXPECT_EQ(tempo_of(env), 90) << odd_one;
-        EXPECT_GT(calc_bpm_acf(env.data(), 64, 3, 64, kHop), 200) << odd_one;
+        env[5] = value;
+        EXPECT_EQ(estimate(env), 90) << value;
+        EXPECT_GT(calc_bpm_acf(env.data(), 64, 3, 64, kHop), 200) << value;
     }
 }

@@ -1,4 +1,4 @@
-"""What the tests of the command share: running it, songs, what its output holds."""
+"""Helpers for the tests of the command: songs, running it, reading its output."""
 import json
 import os
 import pathlib
@@ -15,7 +15,7 @@ _songs = tempfile.TemporaryDirectory()
 
 
 def song(**options):
-    """A song, made once for each set of options. Returns its path."""
+    """Returns the path of a song. Each set of options is generated only once."""
     words = [word for k, v in sorted(options.items()) for word in ("--" + k.replace("_", "-"), str(v))]
     path = pathlib.Path(_songs.name, "".join(words) + ".wav")
     if not path.exists():
@@ -32,7 +32,7 @@ def short_song(seed=1):
 
 
 def wav(seconds=2.0, rate=44100, channels=1, bits=16, tag=1, data_size=None, sample=b"\x12\x34"):
-    """A WAV file's bytes, written independently of the project's own writer."""
+    """Bytes of a WAV file, built without the project's own writer."""
     frame = channels * bits // 8
     data = (sample * (frame * 8))[:frame] * round(seconds * rate)
     size = len(data) if data_size is None else data_size
@@ -41,13 +41,13 @@ def wav(seconds=2.0, rate=44100, channels=1, bits=16, tag=1, data_size=None, sam
     return head + b"data" + struct.pack("<I", size) + data
 
 
-# Words before a command that make root obey file permissions.
+# Prefix of a command that makes root obey file permissions.
 AS_ORDINARY_USER = [] if os.getuid() != 0 else [
     "setpriv", "--inh-caps=-all", "--bounding-set=-dac_override,-dac_read_search"]
 
 
 def seconds(text):
-    """h:mm:ss.mmm, m:ss or seconds."""
+    """Converts h:mm:ss.mmm, m:ss or seconds."""
     return sum(float(part) * 60 ** i for i, part in enumerate(reversed(text.split(":"))))
 
 
@@ -67,12 +67,12 @@ class Case(unittest.TestCase):
         return path
 
     def assert_only(self, *names):
-        """The folder holds these files and nothing else, hidden ones counted."""
+        """Checks that the folder contains exactly these files, including hidden ones."""
         self.assertEqual({p.name for p in self.folder.iterdir()}, set(names))
 
     def run_tavo(self, *arguments, status=0, printed=None, said=b"", before=(), **options):
-        """Runs in the case's folder; arguments may be bytes. printed is all of the standard output, said a part
-        of the messages."""
+        """Runs the command in the folder of the test. Arguments may be bytes. printed: the expected standard
+        output. said: a part of the expected messages."""
         options = {"input": b"", "cwd": self.folder, "timeout": 250, **options}
         done = subprocess.run([*before, TAVO, *arguments], capture_output=True, **options)
         told = (arguments, done.stdout, done.stderr)
@@ -82,15 +82,15 @@ class Case(unittest.TestCase):
         return done
 
     def start(self, *arguments, **options):
-        """The command in a session of its own, ended with the test."""
+        """Starts the command in its own session. It ends with the test."""
         options = {**dict.fromkeys(("stdin", "stdout", "stderr"), subprocess.PIPE), **options}
         process = self.enterContext(subprocess.Popen([TAVO, *arguments], cwd=self.folder, start_new_session=True,
                                                      **options))
-        self.addCleanup(process.kill)  # runs first
+        self.addCleanup(process.kill)  # runs before the context exits
         return process
 
     def wait_until(self, condition):
-        """Returns what the condition gives once that is true."""
+        """Waits until the condition is true. Returns its value."""
         for _ in range(3000):
             if found := condition():
                 return found
@@ -98,13 +98,13 @@ class Case(unittest.TestCase):
         self.fail("it did not happen within a minute")
 
     def objects(self, text):
-        """Each line one JSON object in strict UTF-8, NaN and the like refused."""
+        """Parses one JSON object per line, in strict UTF-8 and without NaN or infinity."""
         self.assertTrue(text == b"" or text.endswith(b"\n"), text)
         return [json.loads(line.decode("utf-8"), parse_constant=self.fail)
                 for line in text.split(b"\n")[:-1]]
 
     def run_json(self, *arguments, status=0, **options):
-        """The results, without the time that each took."""
+        """Returns the results without cpu_ms."""
         results = self.objects(self.run_tavo("--format", "json", *arguments, status=status, **options).stdout)
         for result in results:
             self.assertTrue(result.pop("cpu_ms", -1) >= 0 or result["status"] != "ok", result)

@@ -1,4 +1,4 @@
-"""What the command does with the ffmpeg program: it decodes what the library refuses and cuts clips."""
+"""Tests the ffmpeg program as decoder of formats that the library does not support, and as cutter of clips."""
 import os
 import pathlib
 import signal
@@ -9,18 +9,18 @@ from command_case import Case, song
 
 SONG = song(seconds=20, bpm=120, loud_at=8)
 
-ENCODED = {  # name: options of ffmpeg
+ENCODED = {  # file name: options for ffmpeg
     "24.wav": "-c:a pcm_s24le", "float.wav": "-c:a pcm_f32le", "96k.wav": "-ar 96000", "4k.wav": "-ar 4000",
     "a.aiff": "", "alac.m4a": "-c:a alac", "a.opus": "", "a.webm": "-c:a libopus", "a.wma": "",
     "-b:c.mkv": "-c:a flac",
     "late.mkv": "-f lavfi -i testsrc=size=64x64:rate=10:duration=20 -itsoffset 0.5 -i SONG -map 1 -map 2"}
-FAILING = {  # an ffmpeg of ours: what is said about it
+FAILING = {  # script of a fake ffmpeg: part of the message
     "kill -9 $$": "ffmpeg was ended by signal 9", "echo '[x @ 0x1] bad box.' >&2; echo y >&2; exit 1": "ffmpeg: bad box.",
     "head -c 300000 a.wav; exit 3": "ffmpeg ended with status 3.",
     "head -c 44 a.wav; cat /dev/zero": "longer than a file of its size can hold", "exit 0": "decodes nothing", "exec sleep 60": ""}
 CLIPPED = {"a.wav": "", "a.mp3": "", "bare.mp3": "-write_xing 0", "a.m4a": "", "a.flac": "", "a.ogg": "", "a.aac": "", "a.webm": "-c:a libopus",
            "late.mkv": ENCODED["late.mkv"]}
-RATE, FRAME = 44100, 1152  # of the sound compared; samples of the longest compressed frame
+RATE, FRAME = 44100, 1152  # Hz; samples of the longest compressed frame
 NAMING_OTHERS = {"a.m3u8": b"#EXTM3U\n#EXT-X-TARGETDURATION:60\n#EXTINF:60,\na.ts\n#EXT-X-ENDLIST\n",
                  "a.ffconcat": b"ffconcat version 1.0\nfile a.ts\n", "a.mkv": b"ffconcat version 1.0\nfile a.ts\n"}
 
@@ -41,7 +41,7 @@ class Ffmpeg(Case):
         return {"env": {"PATH": f"{program.parent}:/usr/bin:/bin"}}
 
     def sound(self, path):
-        """A file's samples as players have them."""
+        """Returns the samples of a file as a player hears them."""
         words = ["-i", path, "-af", "aresample=async=1:first_pts=0", "-ac", "1", "-ar", str(RATE), "-f", "s16le", "-"]
         done = subprocess.run(["ffmpeg", "-nostdin", "-v", "error", *words], cwd=self.folder, check=True, capture_output=True)
         return np.frombuffer(done.stdout, np.int16).astype(float)

@@ -1,4 +1,4 @@
-"""The same song gives the same result in every format, up to what its encoder changes."""
+"""Checks that a song has the same result in every format, except for changes by the encoder."""
 import array
 import operator
 import random
@@ -6,8 +6,8 @@ import subprocess
 
 from command_case import SONGS, Case, wav
 
-# An encoder's delay moves the song between the frames of the analysis, which moves beats by a frame of
-# 23 ms either way. So an encoded song is compared with one that has lost nothing and comes as late.
+# The delay of an encoder shifts the song against the frames of the analysis, which can shift beats by one
+# frame (23 ms). So an encoded song is compared with a lossless one that has the same delay.
 LATE = {"constant.mp3": "late_576.flac", "variable.mp3": "late_576.flac", "variable_bare.mp3": "late_576.flac",
         "song.aac": "late_1024.flac", "song.m4a": "late_1024.flac", "song.ogg": "song.flac"}
 
@@ -22,14 +22,14 @@ ENCODERS = {
 
 
 def lag(sound, reference):
-    """Milliseconds that a sound of 11025 Hz is later than another."""
+    """Delay of a sound against another in milliseconds, both at 11025 Hz."""
     part = reference[30000:32000]
     lags = range(-700, 700)
     return max(lags, key=lambda k: sum(map(operator.mul, part, sound[30000 + k:]))) / 11.025
 
 
 def share_near(beats, others):
-    """The share of the beats that have one of the others within 25 ms."""
+    """Share of the beats that are within 25 ms of one of the others."""
     return sum(any(abs(beat - other) <= 25 for other in others) for beat in beats) / len(beats)
 
 
@@ -39,27 +39,27 @@ class Formats(Case):
             results = self.run_json("--mode", mode, *LATE, *LATE.values(), "song.wav", cwd=SONGS)
             found = {result.pop("file"): result for result in results}
             plain = found["song.wav"]
-            self.assertEqual(found["song.flac"], plain)  # nothing is lost
-            # A whole second, which a seek in the WAV file reaches as well.
+            self.assertEqual(found["song.flac"], plain)  # FLAC is lossless
+            # The result is a whole second, because a WAV file can only seek to whole seconds.
             self.assertEqual(plain.get("hl_pos_ms"), None if mode == "beats" else 31000)
             self.assertEqual(plain.get("beat_count", 0) > 20, mode != "highlight")
             for name, late in LATE.items():
                 with self.subTest(mode=mode, name=name):
                     self.assertEqual(found[name].get("bpm"), plain.get("bpm"))
                     if mode != "beats":
-                        self.assertAlmostEqual(found[name]["hl_pos_ms"], 31000, delta=400)  # of the finest search
+                        self.assertAlmostEqual(found[name]["hl_pos_ms"], 31000, delta=400)  # resolution of the refinement
                     if mode != "highlight":
                         beats, others = found[name]["beats_ms"], found[late]["beats_ms"]
                         self.assertGreaterEqual(min(share_near(beats, others), share_near(others, beats)), 0.95)
 
     def player_sound(self, name):
-        """As FFmpeg plays it."""
+        """Returns the samples as FFmpeg plays them."""
         return array.array("h", subprocess.run(
             ["ffmpeg", "-v", "error", "-i", name, "-f", "s16le", "-ac", "1", "-ar", "11025", "-"], check=True,
             capture_output=True, cwd=self.folder).stdout)
 
     def library_sound(self, name):
-        """As the library analyses it, with clicks that are far below the noise."""
+        """Returns the samples as the library analyses them, plus clicks far below the noise."""
         self.run_tavo("-q", "-m", "beats", "--force", "--click", "click.wav", name)
         return array.array("h", (self.folder / "click.wav").read_bytes()[44:])
 
@@ -72,7 +72,7 @@ class Formats(Case):
         player, library = self.player_sound("n.wav"), self.library_sound("n.wav")
         for name, command in ENCODERS.items():
             subprocess.run(command.split(), check=True, cwd=self.folder)
-            if name == "edited.m4a":  # Apple's delay in place of FFmpeg's
+            if name == "edited.m4a":  # with the delay of Apple's encoder
                 self.put(name, (self.folder / name).read_bytes().replace(
                     (1024).to_bytes(4, "big") + b"\0\1\0\0", (2112).to_bytes(4, "big") + b"\0\1\0\0", 1))
             if name == "tagged.m4a":  # the same delay in a tag of Apple's, which counts for more than the edit list

@@ -1,4 +1,4 @@
-"""Which files are analysed: names of any bytes, folders, lists."""
+"""Tests the choice of files: names with any bytes, folders, lists."""
 import csv
 import io
 import os
@@ -19,7 +19,7 @@ ODD_NAMES = [
 class Inputs(Case):
     def setUp(self):
         super().setUp()
-        for name in ("a.wav", "b.txt", "inner/deep/d.wav", "../other/o.wav"):  # songs by their content
+        for name in ("a.wav", "b.txt", "inner/deep/d.wav", "../other/o.wav"):  # recognised by content
             self.put("music/" + name)
         self.put("music/letter.mp3", b"Dear reader, this is no song. " * 50)
         self.put("music/short", b"x")
@@ -28,7 +28,7 @@ class Inputs(Case):
         os.mkfifo(self.folder / "music/pipe")
 
     def found(self, *arguments, **options):
-        """The names of the results, as bytes."""
+        """Returns the names of the results as bytes."""
         results = self.run_json("--mode", "highlight", *arguments, **options)
         return [unquote_to_bytes(r["file_bytes"]) if "file_bytes" in r else r["file"].encode() for r in results]
 
@@ -50,7 +50,7 @@ class Inputs(Case):
         self.put(deep)
         self.put("-dash.wav")
         self.assertEqual(self.found("--", "-dash.wav", deep), [b"-dash.wav", deep.encode()])
-        # For people: one line a name, and nothing that a terminal obeys.
+        # Text shows one name per line and no control characters.
         done = self.run_tavo("--mode", "highlight", *ODD_NAMES, b"no\nsuch\x1b\xe9", status=1)
         self.assertEqual(done.stderr, rb"tavo: no\nsuch\x1B\xE9: The file does not exist." + b"\n")
         lines = done.stdout.decode("utf-8").split("\n")
@@ -66,7 +66,7 @@ class Inputs(Case):
         self.assertEqual(self.found("-r", "-j", "2", "music/"), everything)
         self.assertEqual(self.run_tavo("-m", "highlight", "music").stderr,
                          b"tavo: music: 2 files left out, not recognised as audio.\n")
-        for depth in range(24):  # 2 to the 24 ways to the innermost folder
+        for depth in range(24):  # 2^24 paths lead to the innermost folder
             for way in "ab":
                 (self.folder / f"none/{depth}").mkdir(parents=True, exist_ok=True)
                 (self.folder / f"none/{depth}/{way}").symlink_to(f"../{depth + 1}")
@@ -79,12 +79,12 @@ class Inputs(Case):
         self.put("list", a + b"\n")
         sound = (self.folder / "#1.wav").read_bytes()
         for words, text, expected in (
-                ("-", b"music/b.txt\n\nmusic/a.wav\nmusic/inner/deep", [b, a, deep]),  # no last newline
+                ("-", b"music/b.txt\n\nmusic/a.wav\nmusic/inner/deep", [b, a, deep]),  # without a final newline
                 ("--files-from -", b"music/b.txt\nmusic/inner/deep\n", [b, deep]),
                 ("music/b.txt --files-from list", b"", [b, a]),
                 ("-", b"\xef\xbb\xbf#EXTM3U\r\n#EXTINF:60,Song\r\nmusic/a.wav\r\n\r\n#1.wav\r\n", [a, b"#1.wav"])):
             self.assertEqual(self.found(*words.split(), input=text), expected, text)
-        for words, text, said in (  # not a list
+        for words, text, said in (  # not lists
                 ("-", sound, b"sound (WAV), not a list"), ("-0 -", sound, b"sound (WAV)"),
                 ("--files-from music/a.wav", b"", b"name it as FILE"),
                 ("--files-from nowhere", b"", b"list of files cannot be read"),
@@ -93,13 +93,13 @@ class Inputs(Case):
         self.run_tavo("--format", "json", "-", said=b"names no files", printed=b"")
 
     def test_a_list_is_served_as_it_comes(self):
-        """A result is there before the next name is; memory does not grow with the names."""
-        sanitizer = "quarantine_size_mb=0:thread_local_quarantine_size_kb=0"  # it keeps what is freed
+        """Each result is printed before the next name is read. Memory does not grow with the number of names."""
+        sanitizer = "quarantine_size_mb=0:thread_local_quarantine_size_kb=0"  # freed memory is not kept
         process = self.start("--format", "json", "-m", "highlight", "-", stderr=subprocess.DEVNULL,
                              env={**os.environ, "ASAN_OPTIONS": sanitizer})
 
         def answer(names):
-            """The last name answered, the command's memory in KiB."""
+            """Returns the name of the last result and the memory of the command in KiB."""
             threading.Thread(target=send, args=(process, names)).start()
             for _ in range(names.count(b"\n")):
                 (result,) = self.objects(process.stdout.readline())
@@ -111,5 +111,5 @@ class Inputs(Case):
         _, before = answer(missing * 12000)
         name, after = answer(missing * 40000 + b"music/b.txt\n")
         self.assertEqual(name, "music/b.txt")
-        self.assertLess(after - before, 4000)  # the names alone have 8000
+        self.assertLess(after - before, 4000)  # the names alone are 8000 KiB
         self.assertEqual((process.communicate()[0], process.returncode), (b"", 1))

@@ -1,11 +1,11 @@
-"""Files that the command writes - label tracks, click tracks, pages: whole or not there."""
+"""Tests written files: labels, click tracks and pages. Each is complete or does not exist."""
 import os
 import resource
 
 from command_case import AS_ORDINARY_USER, Case, short_song, wav
 
 LABELS = ["--format", "labels"]
-ALL = (  # what writes which file for song.wav, and what is in it
+ALL = (  # arguments, file for song.wav, content
     (LABELS, "song.wav.labels.txt", b"highlight"), (["--click", "c.wav"], "c.wav", b"RIFF"),
     (["--report", "page.html"], "page.html", b"song.wav"), (["--clip", "k.wav", "-l", "2"], "k.wav", b"RIFF"))
 
@@ -72,7 +72,7 @@ class Outputs(Case):
         self.put("y/song.wav", source=short_song(seed=7))
         out = self.folder / "out"
         out.mkdir()
-        for _ in range(2):  # the second is refused whichever is done first
+        for _ in range(2):  # y is refused even if it finishes first
             self.run_tavo(*LABELS, "--force", "-o", "out", "-j", "2", "x", "y", status=1,
                           said=b"tavo: y/song.wav: Its file out/song.wav.", printed=b"out/song.wav.labels.txt\n")
         self.assertEqual(os.listdir(out) + os.listdir(self.folder / "x"), ["song.wav.labels.txt", "song.wav"])
@@ -88,7 +88,7 @@ class Outputs(Case):
         mine = self.put("song.wav.labels.txt", b"mine\n")
         self.run_tavo(*LABELS, "--skip-existing", "song.wav", "other.wav", ".", said=b"4 inputs left out", printed=b"")
         self.assertEqual(mine.read_bytes(), b"mine\n")
-        # Names as long as they may be, 248 bytes, whose marker files cannot have them whole.
+        # Names of 248 bytes are too long for the full name of a marker file.
         names = ["\u00e9" * 120 + ending for ending in ("-one.wav", "-two.wav")]
         for name in names:
             self.put(name)

@@ -1,4 +1,4 @@
-"""The page that plays, in a real browser: Debian's Chromium without a window."""
+"""Tests the report page in Debian's Chromium without a window."""
 import json
 import os
 import re
@@ -59,7 +59,7 @@ class Report(Browser):
         self.put("song.wav", source=standard_song())
         (result,) = self.run_json("--length", "12", "--report", "page.html", "song.wav")
         self.assertNotRegex((self.folder / "page.html").read_text(),
-                            r'(src|href)="|https?://(?!www\.w3\.org/2000/svg)')  # nothing from outside
+                            r'(src|href)="|https?://(?!www\.w3\.org/2000/svg)')  # the page loads nothing
         self.show("page.html")
         self.assertEqual(len(self.find("line.beat")), result["beat_count"])
         self.assertEqual(self.script("return beats"), result["beats_ms"])
@@ -72,8 +72,8 @@ class Report(Browser):
             self.wait(f"Math.abs(player.now() - {ms}) < 1")
         self.script("seek(arguments[0])", result["hl_end_ms"] - 200)
         self.click("loop", "play")
-        self.wait(f"player.now() < {start + 3000}")  # past its end, back at its start
-        self.wait("scheduled.length > 0")  # clicks
+        self.wait(f"player.now() < {start + 3000}")  # has looped back to the start
+        self.wait("scheduled.length > 0")  # clicks are scheduled
         self.click("play")
 
         (timeline,) = self.find("#timeline")
@@ -107,20 +107,20 @@ class Report(Browser):
             self.run_tavo("--report", "page.html", "--force", *arguments, name)
             return json.loads(re.search(r'id="data">(.*?)</script>', (self.folder / "page.html").read_text())[1])
 
-        # 10 s: half a full-scale square wave from 4 s on, silence before.
+        # 4 s of silence, then 6 s of a square wave at half of full scale.
         rate, level = 8000, 32768 // 2
         loud = b"".join(struct.pack("<h", level if i // 40 % 2 else -level) for i in range(6 * rate))
         self.put("steps.wav", wav(seconds=10, rate=rate)[:44] + bytes(2 * 4 * rate) + loud)
         page = view("steps.wav", "--mode", "highlight")
-        wave = page["wave"]  # 4000 columns of 2.5 ms: the 1600th starts with the sound
+        wave = page["wave"]  # 4000 columns of 2.5 ms; the sound starts at column 1600
         self.assertEqual((len(wave), {*wave[:3198]}, {*wave[3202:]}), (8000, {0}, {-127, 127}))
-        # 10 log10(1 + part / 4): a third, two thirds and all of the window is loud, mean square 1/4.
+        # 10 log10(1 + share / 4): the sound fills a third, two thirds and all of a window. Its mean square is 1/4.
         for value, expected in zip([*page["loudness"], page["mean"]], (0.348, 0.669, 0.969, 0.662), strict=True):
             self.assertAlmostEqual(value, expected, delta=0.001)
         for seconds, searched in ((60, [0, 42000]), (100, [18000, 52000])):
             self.put("song.wav", source=song(seconds=seconds, bpm=120, rate=8000, channels=1))
             self.assertEqual(view("song.wav", "--mode", "highlight")["searched_ms"], searched)
-        # An MP3, whose encoder's delay players drop.
+        # Players skip the delay of an MP3 encoder.
         subprocess.run(["lame", "--quiet", standard_song(), self.folder / "song.mp3"], check=True)
         page = view("song.mp3", "--length", "12")
         (result,) = self.run_json("--length", "12", "song.mp3")

@@ -1,4 +1,4 @@
-"""What the command says in every format: results, refused files, wrong usage."""
+"""Tests output in every format: results, refused files, usage errors."""
 import csv
 import io
 import os
@@ -31,7 +31,7 @@ USAGE = [
     ("--normalize --no-ffmpeg a.wav", "needs the ffmpeg"), ("--normalize -m beats a.wav", "needs a highlight"),
     ("--normalize --store a.db a.wav", "does not go with --store"),
 ]
-REFUSED = {  # content when it is a file of ours, a part of the sentence
+REFUSED = {  # content, part of the sentence
     "empty.wav": (b"", "empty"),
     "fifteen.wav": (b"RIFF\0\0\0\0WAVEfmt", "too short to be audio: it has 15 bytes"),
     "text.wav": (b"This is a letter, not a song.\n" * 99, "not recognised"),
@@ -73,17 +73,17 @@ class Results(Case):
             self.assertEqual(list(result), KEYS + keys)
             self.assertEqual([result[key] for key in KEYS], ["song.wav", mode, "ok", 44100, 2, 60000, 0])
             if mode != "beats":
-                # In mode both a WAV file's highlight moves to a whole second.
+                # In mode both the highlight of a WAV file is rounded to a whole second.
                 self.assertAlmostEqual(result["hl_pos_ms"], 20000, delta=1000)
                 self.assertEqual(result["hl_end_ms"], result["hl_pos_ms"] + 12000)
             if mode != "highlight":
-                self.assertIn(result["bpm"], (117, 120, 123))  # neighbours on the grid of hops
+                self.assertIn(result["bpm"], (117, 120, 123))  # 120 and the nearest tempos with a whole number of hops
                 self.assertTrue(10 < result["beat_count"] == len(result["beats_ms"]))
                 few = self.analyse(f"--mode {mode} --max-beats 3")
                 self.assertLess(few["beat_count"], result["beat_count"])
         self.assertNotIn("hl_end_ms", few)
         self.assertEqual(self.analyse(), self.analyse("--mode both"))
-        self.assertEqual(self.analyse("--length 86400")["hl_end_ms"], 60000)  # the song's own
+        self.assertEqual(self.analyse("--length 86400")["hl_end_ms"], 60000)  # end of the song
 
     def test_csv_and_text_say_the_same(self):
         result = self.analyse()
@@ -92,7 +92,7 @@ class Results(Case):
         self.assertEqual(list(rows[0]), KEYS + ["hl_pos_ms", "hl_end_ms", "hl_refined"] + BEATS + ["cpu_ms", "error"])
         for key in KEYS[:-1] + ["hl_pos_ms", "bpm", "beat_count"]:
             self.assertEqual(rows[0][key], str(result[key]))
-        single = struct.Struct(f"{result['beat_count']}f")  # the library's own precision
+        single = struct.Struct(f"{result['beat_count']}f")  # precision of the library
         self.assertEqual(single.pack(*map(float, rows[0]["beats_ms"].split())), single.pack(*result["beats_ms"]))
         self.assertEqual([rows[1][key] for key in ("file", "status", "bpm", "error")],
                          ["missing, really.wav", "failed", "", "The file does not exist."])
@@ -106,7 +106,7 @@ class Results(Case):
 """)
 
     def test_a_coarse_highlight_is_called_so(self):
-        # A song too quiet for the refinement: a point of the curve with a value each 2 s.
+        # This song is too quiet for the refinement. The coarse curve has a value every 2 s.
         loud = standard_song().read_bytes()
         samples = memoryview(loud[44:]).cast("h")
         for level, refined in ((1, True), (16, False)):

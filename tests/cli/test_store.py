@@ -1,4 +1,4 @@
-"""Results in a database: each song once, whatever happens, with the same result as without a store."""
+"""Tests results in a database. Each song is stored once, with the same result as without a store."""
 import json
 import os
 import random
@@ -41,7 +41,7 @@ class Store(Case):
             self.assert_same(row, result)
             self.assertEqual([row[key] for key in ("size", "mtime_ns", "mode", "length_s", "max_beats")],
                              [state.st_size, state.st_mtime_ns, "both", 5, 0])
-        # All are known, the failed one too.
+        # All songs are known, including the failed one.
         self.run_tavo("--store", "sqlite:x.db", "--format", "json", *words, status=1,
                       said=b"0 stored, 3 known already (1 failed; --retry-failed)", printed=b"")
 
@@ -101,14 +101,14 @@ class Store(Case):
         self.run_tavo(*STORE, *names, "--length", "5")
         expected = self.run_json(*names, "--length", "5")
         for name in names:
-            os.unlink(self.folder / name)  # nothing is analysed
+            os.unlink(self.folder / name)  # only the store is read
         self.assertEqual(self.run_json(*STORE, "--from-store", "--length", "5"), expected)
         self.run_tavo(*STORE, "--from-store", "--length", "5", "--format", "labels")
         start, end = (expected[1][key] / 1000 for key in ("hl_pos_ms", "hl_end_ms"))
         self.assertIn(f"{start:.6f}\t{end:.6f}\thighlight", (self.folder / "song 1.wav.labels.txt").read_text())
         self.run_tavo(*STORE, "--from-store", status=2)
         self.run_tavo("--store", "", "--format", "json", names[0], status=2, said=b"--store", printed=b"")
-        # The store and its folder need not be writable, and it needs no log there.
+        # Reading works although the store and its folder are not writable.
         for path in self.folder.glob("x.db-*"):
             path.unlink()
         (self.folder / "x.db").chmod(0o444)
@@ -117,20 +117,20 @@ class Store(Case):
         self.assertEqual(self.run_json(*STORE, "--from-store", "--length", "5", before=AS_ORDINARY_USER), expected)
 
     def test_markers_of_a_run_that_was_killed(self):
-        """They were written, but the rows of their songs were lost."""
+        """The marker files were written, but the rows of the songs were lost."""
         names = self.put_songs(3)
         words = (*STORE, "--format", "labels", *names)
         self.run_tavo(*words)
         for path in self.folder.glob("x.db*"):
             path.unlink()
         self.put("song 1.wav.labels.txt", b"of somebody else\n")
-        for stored, known in ((2, 0), (0, 2)):  # song 1 is not stored as failed: it is tried again
+        for stored, known in ((2, 0), (0, 2)):  # song 1 is not stored as failed, so it is analysed again
             self.run_tavo(*words, status=1, said=b"song 1.wav: The file song 1.wav.labels.txt exists already")
             self.assertEqual([row["status"] for row in self.rows().values()], ["ok"] * 2)
         self.run_tavo(*words, "--force", said=b"1 stored, 2 known")
 
     def test_a_store_of_the_first_version(self):
-        """It has no offset_ms and decoder, and its rows may be damaged."""
+        """Such a store lacks offset_ms and decoder. Some rows are damaged too."""
         self.put("a.wav")
         self.put("bad.wav", content=b"RIFF" + bytes(60))
         self.run_tavo(*STORE, "a.wav", "bad.wav", status=1)

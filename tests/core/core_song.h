@@ -1,4 +1,4 @@
-// The song of the tests of this folder: 100 s at 120 BPM, loud from 41 s to 80 s.
+// The song of the tests in this folder: 100 s at 120 BPM, loud from 41 s to 80 s.
 #ifndef TAVO_TESTS_CORE_CORE_SONG_H
 #define TAVO_TESTS_CORE_CORE_SONG_H
 
@@ -16,29 +16,29 @@ namespace core_song {
 constexpr std::initializer_list<int32_t> kModes = {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS,
                                                    TAVO_MODE_BOTH};
 
-// A WAV file for as long as the program runs.
+// A WAV file that is deleted when the program ends.
 struct file : support::temporary_file {
-    explicit file(const support::song &of)
-        : temporary_file("core_" + std::to_string(of.pcm.size()) + ".wav"), song(of) {
+    explicit file(const support::song &contents)
+        : temporary_file("core_" + std::to_string(contents.pcm.size()) + ".wav"), song(contents) {
         EXPECT_TRUE(support::write_wav(path, song));
     }
     const support::song song;
 };
 
 inline const file &whole() {
-    static const file made(support::make_song({22050, 1, 100.0, 120.0, 1, 41.0, 80.0}));
-    return made;
+    static const file whole_song(support::make_song({22050, 1, 100.0, 120.0, 1, 41.0, 80.0}));
+    return whole_song;
 }
 
-// An instance of the song in each mode, which the action releases.
+// Creates an instance of the song in each mode and passes it to the test, which releases it.
 template <typename action>
-void for_each_mode(std::initializer_list<int32_t> modes, action act) {
+void for_each_mode(std::initializer_list<int32_t> modes, action test) {
     for (const int32_t mode : modes) {
         SCOPED_TRACE(mode);
         int32_t err = 99;
         TAVO_CTX *ctx = job::create(whole().path, mode, &err);
         EXPECT_EQ(err, 0);
-        if (ctx != nullptr) act(mode, ctx);
+        if (ctx != nullptr) test(mode, ctx);
     }
 }
 

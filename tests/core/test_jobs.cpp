@@ -25,16 +25,16 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     EXPECT_EQ(loudness != nullptr, mode != TAVO_MODE_BEATS);
     EXPECT_EQ(points, mode != TAVO_MODE_BEATS ? (100 - 6) / 2 + 1 : 0);
     EXPECT_TRUE(loudness == nullptr || loudness[45 / 2] > 2 * loudness[35 / 2]);
-    // The nearest periods of whole frames are 21 and 22, 123 and 117 BPM.
+    // The nearest periods of whole hops are 21 and 22, 123 and 117 BPM.
     EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);
     EXPECT_EQ(tavo_deinit(ctx), 0);
-    EXPECT_STREQ(job::flaw_of(job::last, mode), nullptr);
+    EXPECT_STREQ(job::find_inconsistency(job::last, mode), nullptr);
     EXPECT_EQ(result.status, 0);
     return result;
 }
 
-// True if a drum is hit within two hops of a time in ms.
-bool on_a_hit(float ms) {
+// True if a drum hit is within two hops of a time in ms.
+bool is_on_a_hit(float ms) {
     const std::vector<double> &hits = core_song::whole().song.hits;
     return std::any_of(hits.begin(), hits.end(), [ms](double hit) {
         return std::fabs(hit * 1000.0 - static_cast<double>(ms)) <= 2 * 23.22;
@@ -49,15 +49,15 @@ TEST(Jobs, BeatsFallOnTheDrums) {
     const job::result result = run(core_song::whole().path, TAVO_MODE_BEATS);
     EXPECT_EQ(result.hl_pos, 0);
     ASSERT_GT(result.beat_count, 20);
-    const auto on_hits = std::count_if(result.beats.begin(), result.beats.end(), on_a_hit);
+    const auto on_hits = std::count_if(result.beats.begin(), result.beats.end(), is_on_a_hit);
     EXPECT_GE(on_hits * 10, result.beat_count * 9);
 }
 
-// Mode 2 equals mode 1 of a file that starts where mode 2's highlight does.
-TEST(Jobs, BothIsBeatsOfTheRestOfTheFile) {
+// Mode 2 finds the same beats as mode 1 in a file that starts at mode 2's highlight.
+TEST(Jobs, BothFindsTheBeatsOfTheRestOfTheFile) {
     const job::result both = run(core_song::whole().path, TAVO_MODE_BOTH, 7);
     ASSERT_GT(both.hl_pos, 1000);
-    EXPECT_EQ(both.hl_pos % 1000, 0);  // WAV seeks land on whole seconds
+    EXPECT_EQ(both.hl_pos % 1000, 0);  // WAV seeks reach whole seconds
 
     support::song rest = core_song::whole().song;
     rest.pcm.erase(rest.pcm.begin(), rest.pcm.begin() + both.hl_pos / 1000 * rest.plan.rate);
@@ -70,8 +70,8 @@ int32_t read_nothing(mtsrc_ctx *, int32_t, mtsrc_frame *) {
     return TAVO_ERR_READ;
 }
 
-// A failing decoding or conversion is reported in the modes with beats, with the highlight that was
-// found before; in mode 0, tavo_has_audio reports it.
+// The modes with beats report a failed decoding or conversion, with any highlight that was found
+// before. In mode 0 tavo_has_audio reports it.
 TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     for (const bool decodes : {false, true}) {
         for_each_mode(kModes, [decodes](int32_t mode, TAVO_CTX *ctx) {
@@ -79,12 +79,12 @@ TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
             for (int32_t i = 0; i < ctx->seg_count && !decodes; ++i) {
                 ctx->seg[i].src->get_frm = read_nothing;
             }
-            if (decodes) ctx->ana_rate = -1;  // to which nothing is converted
+            if (decodes) ctx->ana_rate = -1;  // an invalid rate, so the conversion fails
             EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
             const job::result result = job::wait();
             EXPECT_EQ(result.status, mode == TAVO_MODE_HIGHLIGHT ? 0 : -1);
             EXPECT_NEAR(result.hl_pos, decodes && mode != TAVO_MODE_BEATS ? 41'000 : 0, 400);
-            EXPECT_STREQ(job::flaw_of(result, mode), nullptr);
+            EXPECT_STREQ(job::find_inconsistency(result, mode), nullptr);
             EXPECT_EQ(tavo_has_audio(ctx), decodes);
             EXPECT_EQ(tavo_is_complete(ctx), decodes);
             EXPECT_EQ(tavo_get_tempo(ctx), 0);
@@ -93,8 +93,8 @@ TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     }
 }
 
-// The beat analysis alone, on an analysis signal put into the instance, returns to its caller. In
-// mode 2 it shifts the beats by the highlight start; without an onset context it reports a failure.
+// Runs only the beat analysis, with an analysis signal stored in the instance. In mode 2 it shifts
+// the beats by the highlight start; without an onset context it reports a failure.
 TEST(Jobs, BeatAnalysisAloneReportsInEveryMode) {
     const support::song song = support::make_song({11025, 1, 20.0, 120.0, 1, 0.0});
     std::vector<float> beats[3];
@@ -113,7 +113,7 @@ TEST(Jobs, BeatAnalysisAloneReportsInEveryMode) {
         ctx->ana_len = 0;  // a second analysis, which finds nothing
         EXPECT_EQ(analyzeOnsetenv(ctx), 0);
         EXPECT_TRUE(job::last.status == -1 && job::last.beat_count == 0 && job::last.null_beats);
-        if (mode == TAVO_MODE_HIGHLIGHT) free(signal);  // not the instance's to release there
+        if (mode == TAVO_MODE_HIGHLIGHT) free(signal);  // in this mode the instance does not own it
         EXPECT_EQ(tavo_deinit(ctx), 0);
     });
     EXPECT_TRUE(beats[0].empty() && beats[1].size() > 3);

@@ -15,7 +15,7 @@ namespace {
 using core_song::for_each_mode;
 using core_song::kModes;
 
-TEST(Lifecycle, CreationMakesWhatTheModeNeeds) {
+TEST(Lifecycle, InitCreatesTheContextsOfTheMode) {
     for_each_mode(kModes, [](int32_t mode, TAVO_CTX *ctx) {
         EXPECT_EQ(memcmp(ctx, "ZEKA", 4), 0);
         EXPECT_EQ(ctx->state, 1);
@@ -33,18 +33,18 @@ TEST(Lifecycle, CreationMakesWhatTheModeNeeds) {
         EXPECT_TRUE(rate == 22050 && channels == 1 && ms == 100'000);
         EXPECT_EQ(tavo_get_tempo(ctx), 0);
         EXPECT_TRUE(tavo_has_audio(ctx) == 0 && tavo_is_complete(ctx) == 0);
-        EXPECT_EQ(_tavo_quit(ctx), 0);  // no job: nothing to stop
+        EXPECT_EQ(_tavo_quit(ctx), 0);  // no job to stop
         EXPECT_EQ(ctx->quit, 0);
         EXPECT_EQ(tavo_deinit(ctx), 0);
         EXPECT_EQ(job::last.calls, 0);
     });
 }
 
-TEST(Lifecycle, CreationFailsWithOneCode) {
+TEST(Lifecycle, InitFailsWithOneCode) {
     const struct {
         std::string path;
         uint32_t calls;
-        int64_t place;  // that fails: the instance's lock, then the decoding's
+        int64_t index;  // index of the failing call: the instance's lock, then the decoding's
     } cases[] = {
         {core_song::whole().path + ".missing", fault::kNothing, 0},
         {testing::TempDir(), fault::kNothing, 0},
@@ -54,8 +54,8 @@ TEST(Lifecycle, CreationFailsWithOneCode) {
         {core_song::whole().path, fault::kCondition, 1},
     };
     for (const auto &each : cases) {
-        SCOPED_TRACE(testing::Message() << each.path << each.calls << each.place);
-        fault::arm({each.calls, each.place});
+        SCOPED_TRACE(testing::Message() << each.path << each.calls << each.index);
+        fault::arm({each.calls, each.index});
         int32_t err = 99;
         EXPECT_EQ(job::create(each.path, TAVO_MODE_BOTH, &err), nullptr);
         EXPECT_EQ(err, -4);
@@ -105,7 +105,7 @@ TEST(Listener, IsCalledOnceWithTheHostsPointerInsteadOfTheCallback) {
     });
 }
 
-TEST(Lifecycle, BadHandlesTouchNothing) {
+TEST(Lifecycle, BadHandlesChangeNothing) {
     TAVO_CTX wrong{};
     memcpy(wrong.magic, "KOVA", 4);
     wrong.state = 1;
@@ -125,8 +125,8 @@ TEST(Lifecycle, BadHandlesTouchNothing) {
     EXPECT_TRUE(wrong.state == 1 && wrong.quit == 0);
 }
 
-// Its mode is unknown, or the thread is refused.
-TEST(Lifecycle, AJobThatCannotStartLeavesTheInstanceReady) {
+// The mode is unknown, or the thread cannot be started.
+TEST(Lifecycle, FailedStartLeavesTheInstanceReady) {
     for_each_mode({-1, 3, TAVO_MODE_HIGHLIGHT}, [](int32_t mode, TAVO_CTX *ctx) {
         fault::arm({fault::kThread, 0});
         EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), mode == TAVO_MODE_HIGHLIGHT ? -2 : -4);
@@ -138,82 +138,82 @@ TEST(Lifecycle, AJobThatCannotStartLeavesTheInstanceReady) {
     });
 }
 
-// Inside the callback, where the state is final: no second start, no release; and a release from
-// outside waits until the callback has returned.
+// Inside the callback the state is final. The job cannot be started again, the instance cannot be
+// released, and a release on another thread waits until the callback returns.
 struct {
     TAVO_CTX *ctx;
     std::atomic<bool> entered, left;
     int32_t deinit_code;
-} visit;
+} callback_state;
 
-void stay_until_waited_for(TAVO_INFO *) {
-    visit.deinit_code = tavo_deinit(visit.ctx);
-    visit.entered = true;
-    while (pthread_mutex_trylock(&tavo_mutex) == 0) {  // held by the tavo_deinit that joins
+void wait_for_tavo_deinit(TAVO_INFO *) {
+    callback_state.deinit_code = tavo_deinit(callback_state.ctx);
+    callback_state.entered = true;
+    while (pthread_mutex_trylock(&tavo_mutex) == 0) {  // until tavo_deinit holds it while joining
         pthread_mutex_unlock(&tavo_mutex);
         std::this_thread::yield();
     }
-    // By then a release that does not wait has returned.
+    // A tavo_deinit that does not wait would return within this time.
     std::this_thread::sleep_for(std::chrono::milliseconds(20));
-    visit.left = true;
+    callback_state.left = true;
 }
 
-void visit_callback_of(TAVO_CTX *ctx) {
-    visit.ctx = ctx;
-    visit.entered = visit.left = false;
-    job::inside = stay_until_waited_for;
+void block_callback_of(TAVO_CTX *ctx) {
+    callback_state.ctx = ctx;
+    callback_state.entered = callback_state.left = false;
+    job::during_callback = wait_for_tavo_deinit;
 }
 
-TEST(Lifecycle, AJobIsNotStartedTwiceAndReleasedAfterItsCallback) {
+TEST(Lifecycle, JobStartsOnceAndIsReleasedAfterItsCallback) {
     for_each_mode(kModes, [](int32_t, TAVO_CTX *ctx) {
-        visit_callback_of(ctx);
-        fault::plan by = {fault::kThread};  // each thread finds the job running
-        by.watch = [] { EXPECT_EQ(load_flag(&visit.ctx->state), 2); };
-        fault::arm(by);
+        block_callback_of(ctx);
+        fault::plan plan = {fault::kThread};  // each thread finds the job running
+        plan.on_call = [] { EXPECT_EQ(load_flag(&callback_state.ctx->state), 2); };
+        fault::arm(plan);
         ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
         EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -5);
-        while (!visit.entered) std::this_thread::yield();
-        EXPECT_EQ(visit.deinit_code, -4);
+        while (!callback_state.entered) std::this_thread::yield();
+        EXPECT_EQ(callback_state.deinit_code, -4);
         EXPECT_EQ(load_flag(&ctx->state), 3);
         EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), -5);
         EXPECT_EQ(tavo_deinit(ctx), 0);
-        EXPECT_TRUE(visit.left);
+        EXPECT_TRUE(callback_state.left);
         fault::disarm();
         EXPECT_TRUE(job::last.calls == 1 && job::last.status == 0);
     });
 }
 
-int32_t (*read_behind_gate)(mtsrc_ctx *, int32_t, mtsrc_frame *) = nullptr;
+int32_t (*original_get_frm)(mtsrc_ctx *, int32_t, mtsrc_frame *) = nullptr;
 
-int32_t read_once_stopped(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
-    while (load_flag(&visit.ctx->quit) == 0) std::this_thread::yield();
-    return read_behind_gate(src, want, frame);
+int32_t read_after_stop(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
+    while (load_flag(&callback_state.ctx->quit) == 0) std::this_thread::yield();
+    return original_get_frm(src, want, frame);
 }
 
-// A stop that arrives while decoding waits for it, then costs the beats but not the highlight. The
-// watcher that waits for the end may be refused its thread.
-TEST(Lifecycle, AStopDuringDecodingEndsBeforeTheBeats) {
+// Stopping during decoding waits for the decoding and then skips the beats but not the highlight.
+// The thread that watches for the end may be impossible to start.
+TEST(Lifecycle, StopDuringDecodingSkipsTheBeats) {
     for (const bool watched : {true, false}) {
         for_each_mode(kModes, [watched](int32_t mode, TAVO_CTX *ctx) {
             SCOPED_TRACE(watched);
-            read_behind_gate = ctx->seg[0].src->get_frm;
+            original_get_frm = ctx->seg[0].src->get_frm;
             for (int32_t i = 0; i < ctx->seg_count; ++i) {
-                ctx->seg[i].src->get_frm = read_once_stopped;
+                ctx->seg[i].src->get_frm = read_after_stop;
             }
-            visit_callback_of(ctx);
-            // The job's thread, its four, then the watcher: they come in this order.
+            block_callback_of(ctx);
+            // Threads start in this order: the job's, its four decoding threads, the watcher.
             fault::arm({fault::kThread, watched ? INT64_MAX : 5});
             ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
-            while (fault::met() < 5) std::this_thread::yield();
+            while (fault::counted_calls() < 5) std::this_thread::yield();
             if (!watched) {
                 EXPECT_EQ(_tavo_quit(ctx), 0);
                 EXPECT_EQ(load_flag(&ctx->state), mode == TAVO_MODE_HIGHLIGHT ? 3 : 4);
-                EXPECT_EQ(fault::refused(), 1);
+                EXPECT_EQ(fault::failed_calls(), 1);
             }
             EXPECT_EQ(tavo_deinit(ctx), 0);
-            EXPECT_TRUE(visit.left);
+            EXPECT_TRUE(callback_state.left);
             fault::disarm();
-            EXPECT_STREQ(job::flaw_of(job::last, mode), nullptr);
+            EXPECT_STREQ(job::find_inconsistency(job::last, mode), nullptr);
             EXPECT_EQ(job::last.status, mode == TAVO_MODE_HIGHLIGHT ? 0 : -1);
             EXPECT_NEAR(job::last.hl_pos, mode == TAVO_MODE_BEATS ? 0 : 41'000, 1000);
         });

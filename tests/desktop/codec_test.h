@@ -1,5 +1,5 @@
-// What tests of encoded files share: the files made by tests/support/make_songs.sh, and media
-// sources read to the end.
+// Helpers for tests of encoded files: the files made by tests/support/make_songs.sh, and media
+// sources that are read to their end.
 #ifndef TAVO_TESTS_DESKTOP_CODEC_TEST_H
 #define TAVO_TESTS_DESKTOP_CODEC_TEST_H
 
@@ -22,20 +22,21 @@ using samples = std::vector<int16_t>;
 
 constexpr int64_t kUnits = 10'000'000;  // per second
 
-// Path of a fixture by its name: golden/NAME in the source tree, else of a song made for the tests.
+// Path of a file by its name: golden/NAME in the source tree, otherwise a song made for the tests.
 inline std::string fixture(const std::string &name) {
-    const bool kept = name.rfind("golden/", 0) == 0;
-    return kept ? CODEC_GOLDEN + name.substr(6) : CODEC_FIXTURES "/" + name;
+    const bool golden = name.rfind("golden/", 0) == 0;
+    return golden ? CODEC_GOLDEN + name.substr(6) : CODEC_FIXTURES "/" + name;
 }
 
-// A file's contents; a missing or empty file fails the test.
+// Returns a file's contents. A missing or empty file fails the test.
 inline std::string load(const std::string &path) {
     const std::string contents = support::contents_of(path);
     EXPECT_FALSE(contents.empty()) << path;
     return contents;
 }
 
-// Writes contents to a file that is the running program's own, until it ends. Returns its path.
+// Writes contents to a file that only this program uses and that exists until it ends. Returns its
+// path.
 inline std::string save(const std::string &name, const std::string &contents) {
     static std::map<std::string, support::temporary_file> saved;
     const std::string path = saved.try_emplace(name, name).first->second.path;
@@ -43,56 +44,56 @@ inline std::string save(const std::string &name, const std::string &contents) {
     return path;
 }
 
-// A source. It is null when it could not be opened; error holds the reason.
-struct opened {
+// An open source. It is null if it could not be opened; then error has the reason.
+struct open_source {
     mtsrc_ctx *source = nullptr;
     int32_t error = 0;
     mtsrc_format format = {};
 
-    explicit opened(const std::string &path) {
+    explicit open_source(const std::string &path) {
         const mtsrc_param param = {path.c_str()};
         source = mtsrc_init(&param, &error);
         EXPECT_TRUE(source == nullptr || mtsrc_getstream_format(source, &format) == 0);
     }
-    ~opened() { EXPECT_TRUE(source == nullptr || mtsrc_deinit(source) == -5); }
-    opened(const opened &) = delete;
-    opened &operator=(const opened &) = delete;
+    ~open_source() { EXPECT_TRUE(source == nullptr || mtsrc_deinit(source) == -5); }
+    open_source(const open_source &) = delete;
+    open_source &operator=(const open_source &) = delete;
 };
 
 // Reads up to limit samples from the source's position. Any failure code fails the test.
 inline samples read(mtsrc_ctx *source, size_t limit = SIZE_MAX) {
-    constexpr int32_t kRequest = 8192;  // bytes, the pipeline's own
+    constexpr int32_t kRequest = 8192;  // bytes, as in a job
     samples all;
-    samples piece(kRequest / 2);
+    samples part(kRequest / 2);
     for (int32_t code = 0; code == 0 && all.size() < limit;) {
-        mtsrc_frame frame = {piece.data(), 0};
+        mtsrc_frame frame = {part.data(), 0};
         code = mtsrc_getstream(source, kRequest, &frame);
         EXPECT_TRUE(code == 0 || code == 1) << code;
-        all.insert(all.end(), piece.begin(), piece.begin() + frame.size / 2);
+        all.insert(all.end(), part.begin(), part.begin() + frame.size / 2);
     }
     all.resize(std::min(all.size(), limit));
     return all;
 }
 
-// All of a file's samples.
+// Reads all samples of a file.
 inline samples read_all(const std::string &path) {
-    const opened file(path);
+    const open_source file(path);
     EXPECT_NE(file.source, nullptr) << path << ": " << file.error;
     return file.source != nullptr ? read(file.source) : samples{};
 }
 
-// The same samples; the first that differs is named.
-inline void expect_same(const samples &got, const samples &wanted) {
-    ASSERT_EQ(got.size(), wanted.size());
-    const auto differs = std::mismatch(got.begin(), got.end(), wanted.begin()).first;
+// Expects equal samples and reports the index of the first difference.
+inline void expect_equal(const samples &got, const samples &expected) {
+    ASSERT_EQ(got.size(), expected.size());
+    const auto differs = std::mismatch(got.begin(), got.end(), expected.begin()).first;
     EXPECT_EQ(differs - got.begin(), static_cast<ptrdiff_t>(got.size())) << "the first to differ";
 }
 
-// A callback record for a path, which must outlive it, for calling the codec library directly.
+// Returns a callback record for direct calls of the codec library. path must outlive it.
 inline mtsrc_io io_for(const std::string &path) {
     mtsrc_io io = {};
     mtsrc_file_callbacks(&io);
-    io.path = const_cast<char *>(path.c_str());  // read only by open
+    io.path = const_cast<char *>(path.c_str());  // only read by open
     return io;
 }
 

@@ -1,4 +1,4 @@
-// The readers of every format, on the fixtures' files.
+// The readers of every format, with real files.
 #include <cstdlib>
 #include <cstring>
 
@@ -11,42 +11,44 @@ using namespace std::string_literals;
 
 class Seek : public testing::TestWithParam<const char *> {};
 
-// A seek reports the first sample at or after its position; from there the output is bit-identical
-// to a linear read. The last quarter has no more than a quarter: four parts have the whole stream.
+// A seek reports the first sample at or after its position, and from there the output is
+// bit-identical to a linear read. The last quarter of the duration holds at most a quarter of the
+// samples, so four parts cover the stream.
 TEST_P(Seek, ReachesTheRequestedSample) {
-    constexpr ptrdiff_t kSeamSamples = 30'000;  // compared after each seek
+    constexpr ptrdiff_t kComparedSamples = 30'000;  // samples compared after each seek
     SCOPED_TRACE(GetParam());
     const samples linear = read_all(fixture(GetParam()));
-    const opened file(fixture(GetParam()));
+    const open_source file(fixture(GetParam()));
     ASSERT_NE(file.source, nullptr) << file.error;
     ASSERT_GT(linear.size(), 0U);
     const int64_t rate = file.format.sample_rate;
     const int64_t duration = file.format.duration;
     EXPECT_EQ(duration * rate / kUnits, static_cast<int64_t>(linear.size()));
-    // The stream's edges, the inside of the first frames, the last quarter, then anywhere.
+    // The edges of the stream, positions inside the first frames, the last quarter, then random
+    // positions.
     const int64_t last_quarter = duration / 4 * 3;
-    std::vector<int64_t> places = {0,        1,           227,         100'000,      133'000,
-                                   200'000,  300'000,     kUnits / 50, last_quarter, duration - 1,
-                                   duration, 2 * duration};
+    std::vector<int64_t> positions = {
+        0,       1,           227,          100'000,      133'000,  200'000,
+        300'000, kUnits / 50, last_quarter, duration - 1, duration, 2 * duration};
     std::mt19937_64 random(7);
-    while (places.size() < 40) {
-        places.push_back(static_cast<int64_t>(random() % static_cast<uint64_t>(duration)));
+    while (positions.size() < 40) {
+        positions.push_back(static_cast<int64_t>(random() % static_cast<uint64_t>(duration)));
     }
-    for (const int64_t position : places) {
+    for (const int64_t position : positions) {
         SCOPED_TRACE("seek to " + std::to_string(position));
         int64_t reached = -1, again = -1;
         ASSERT_EQ(mtsrc_seekstream(file.source, position, &reached), 0);
         const int64_t sample = reached * rate / kUnits;
         const int64_t left = static_cast<int64_t>(linear.size()) - sample;
         ASSERT_GE(left, 0);
-        // The position is at most one sample before the one reached, except at the stream's end.
+        // The requested position is at most one sample before the one reached, except at the end.
         ASSERT_TRUE(reached >= position || left == 0) << reached;
         ASSERT_LT(std::max<int64_t>(reached - position - 1, 0) * rate, kUnits) << reached;
         ASSERT_EQ(mtsrc_seekstream(file.source, reached, &again), 0);
         ASSERT_EQ(again, reached);
-        const auto from = linear.begin() + sample;
-        const samples wanted(from, from + std::min<ptrdiff_t>(left, kSeamSamples));
-        ASSERT_NO_FATAL_FAILURE(expect_same(read(file.source, kSeamSamples), wanted));
+        const auto start = linear.begin() + sample;
+        const samples expected(start, start + std::min<ptrdiff_t>(left, kComparedSamples));
+        ASSERT_NO_FATAL_FAILURE(expect_equal(read(file.source, kComparedSamples), expected));
         EXPECT_TRUE(position != last_quarter || 2 * left <= duration / 4 * 2 * rate / kUnits);
     }
 }
@@ -64,10 +66,10 @@ INSTANTIATE_TEST_SUITE_P(
 
 TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
     const struct {
-        const char *file, *like;
-        size_t front = 0, end = 0;  // samples of the second that the first lacks
+        const char *file, *reference;
+        size_t front = 0, end = 0;  // samples that the file lacks compared with the other one
     } pairs[] = {
-        // Without loss, whatever the blocks and with or without a table for seeking.
+        // Lossless, whatever the block sizes and with or without a seek table.
         {"song.flac", "song.wav"},
         {"no_table.flac", "song.wav"},
         {"mono.flac", "mono.wav"},
@@ -76,7 +78,7 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
         {"golden/variable.flac", "golden/plain.flac", 0, 1408},
         // The frame with the encoder's table is skipped.
         {"vbr.mp3", "vbr_no_table.mp3"},
-        // The same frames, however they are packed and whatever is beside them.
+        // The same frames in different containers, with or without other streams.
         {"golden/program.aac", "golden/plain.aac"},
         {"golden/he.m4a", "golden/he_every.aac"},
         {"last.m4a", "low.aac"},
@@ -94,19 +96,20 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
     };
     for (const auto &pair : pairs) {
         SCOPED_TRACE(pair.file);
-        const samples like = read_all(fixture(pair.like));
-        expect_same(read_all(fixture(pair.file)),
-                    {like.begin() + static_cast<ptrdiff_t>(pair.front),
-                     like.end() - static_cast<ptrdiff_t>(pair.end)});
+        const samples reference = read_all(fixture(pair.reference));
+        expect_equal(read_all(fixture(pair.file)),
+                     {reference.begin() + static_cast<ptrdiff_t>(pair.front),
+                      reference.end() - static_cast<ptrdiff_t>(pair.end)});
     }
-    // Of a stereo stream the bare source drops the start; of a first frame of 384 samples, that.
+    // The bare source drops the start of a stereo stream, but not more than its first frame. In
+    // Layer I that frame has 384 samples.
     EXPECT_EQ(read_all(fixture("stereo3.mp4")).size(), read_all(fixture("cbr.mp3")).size() + 529);
     EXPECT_EQ(read_all(fixture("golden/layer1_44.mp1")).size(), 19U * 384);
     EXPECT_EQ(read_all(fixture("golden/layer1_48.mp1")).size(), 20U * 384);
 }
 
-// ffmpeg's downmix of a song, rounded to 16 bits.
-samples mixed(const std::string &song, const std::string &channels) {
+// Returns ffmpeg's downmix of a song, rounded to 16 bits.
+samples mix_with_ffmpeg(const std::string &song, const std::string &channels) {
     const std::string path = save("mixed.raw", "");
     const std::string command = "ffmpeg -nostdin -v error -y -i " + fixture(song) +
                                 " -af 'pan=mono|c0" + channels + "' -f s32le " + path;
@@ -120,13 +123,14 @@ samples mixed(const std::string &song, const std::string &channels) {
     return out;
 }
 
-// Also where a new decoder starts, every few seconds. The files have no substituted noise. One is
-// too loud for 16 bits, one has blocks that no buffer of the source can hold.
+// The comparison includes positions where a new decoder starts, every few seconds. The files have
+// no substituted noise. One exceeds full scale, and one has blocks larger than any buffer of the
+// source.
 TEST(Reader, AgreesWithFfmpeg) {
     const struct {
-        const char *file, *like, *channels;
-        int off = 1;         // a sample may be, where the channels are mixed or the codec is lossy
-        size_t dropped = 0;  // samples, by the source
+        const char *file, *reference, *channels;
+        int tolerance = 1;   // largest difference, if channels are mixed or the codec is lossy
+        size_t dropped = 0;  // samples dropped by the source
     } files[] = {
         {"wide.flac", "wide.wav", "=c0", 0},
         {"noise.flac", "noise.wav", "=c0", 0},
@@ -142,14 +146,15 @@ TEST(Reader, AgreesWithFfmpeg) {
     };
     for (const auto &each : files) {
         SCOPED_TRACE(each.file);
-        const samples got = read_all(fixture(each.file)), wanted = mixed(each.like, each.channels);
-        ASSERT_EQ(got.size() + each.dropped, wanted.size());
+        const samples got = read_all(fixture(each.file)),
+                      expected = mix_with_ffmpeg(each.reference, each.channels);
+        ASSERT_EQ(got.size() + each.dropped, expected.size());
         for (size_t i = 0; i < got.size(); ++i)
-            ASSERT_LE(std::abs(got[i] - wanted[i + each.dropped]), each.off) << i;
+            ASSERT_LE(std::abs(got[i] - expected[i + each.dropped]), each.tolerance) << i;
     }
 }
 
-// The second channel of a pair, which the source leaves out.
+// The second channel of a pair, which the source does not deliver.
 TEST(Flac, DeliversBothChannels) {
     const std::string path = fixture("song.flac");
     const mtsrc_io io = io_for(path);
@@ -163,86 +168,87 @@ TEST(Flac, DeliversBothChannels) {
         for (size_t i = 1; i < static_cast<size_t>(bytes / 2); i += 2) right.push_back(pairs[i]);
     }
     xflacfd_delete(reader);
-    expect_same(right, mixed("song.wav", "=c1"));
+    expect_equal(right, mix_with_ffmpeg("song.wav", "=c1"));
 }
 
-// The headers state 22,050 Hz; decoding gives 44,100 Hz, 2048 samples a frame.
+// The headers state 22,050 Hz, but decoding gives 44,100 Hz and 2048 samples per frame.
 TEST(Aac, RateAndChannelsComeFromTheFrames) {
     for (const char *name : {"golden/he_every.aac", "golden/he.aac", "golden/he.m4a"}) {
-        const opened file(fixture(name));
+        const open_source file(fixture(name));
         ASSERT_NE(file.source, nullptr) << name;
         EXPECT_EQ(file.format.sample_rate, 44100);
         EXPECT_EQ(file.format.duration * 44100 / kUnits % 2048, 0);
     }
-    // Frames that lost their replication data keep their length, also where a new decoder starts.
+    // Frames without replication data keep their length, even where a new decoder starts.
     const samples he = read_all(fixture("golden/he.aac"));
     for (size_t at = 256 * 2048; at < he.size(); at += 1024) {
         EXPECT_TRUE(std::any_of(&he[at], &he[at] + 1024, [](int16_t s) { return s != 0; })) << at;
     }
 }
 
-// The readers' blocks come in pieces; recognition asks for less and needs it at once.
+// Reads of large blocks return little at once. Recognition requests less and needs all of it.
 TEST(Reader, AcceptsShortReads) {
     for (const char *name :
          {"song.wav", "cbr.mp3", "song.flac", "low.aac", "last.m4a", "song.ogg"}) {
         SCOPED_TRACE(name);
         const std::string path = fixture(name);
         mtsrc_io io = io_for(path);
-        io.path = strdup(path.c_str());  // the source's, once it is open
+        io.path = strdup(path.c_str());  // the source releases it
         io.read = [](mtsrc_file *file, void *buf, int32_t count) {
             return mtsrc_file_read(file, buf, count > 40'000 ? 100 : count);
         };
         int32_t err = 0;
         mtsrc_ctx *source = mtsrc_open_mfal(&io, 0, &err);
         ASSERT_NE(source, nullptr) << err;
-        expect_same(read(source), read_all(path));
+        expect_equal(read(source), read_all(path));
         mtsrc_deinit(source);
     }
 }
 
-// Tags and garbage that bare streams are found in.
+// Bare streams with tags and garbage.
 TEST(Reader, SkipsTagsAndGarbage) {
     std::string file = load(fixture("vbr.mp3"));
     const samples plain = read_all(fixture("vbr_no_table.mp3"));
     constexpr size_t kTable =
-        36;  // after the side information of MPEG-1 stereo; also VBRI's offset
+        36;  // offset after the side information of MPEG-1 stereo; VBRI has the same
     ASSERT_EQ(file.substr(kTable, 4), "Xing");
     for (const char *name : {"Info", "VBRI"})
-        expect_same(read_all(save("table.mp3", file.replace(kTable, 4, name))), plain);
+        expect_equal(read_all(save("table.mp3", file.replace(kTable, 4, name))), plain);
     const std::string ogg = load(fixture("golden/plain.ogg"));
-    // An ID3v2.3 tag of 600 bytes that look like frames of another stream.
+    // An ID3v2.3 tag of 600 bytes that resemble frames of another stream.
     std::string id3v2 = "ID3\3\0\0\0\0\4\x58"s;
     while (id3v2.size() < 610) id3v2 += "\xFF\xFB" + std::string(102, '\x10');
     id3v2.resize(610);
-    // An APE tag of 4,000 bytes that are frames of this one, and its footer.
+    // An APE tag of 4,000 bytes that are frames of this stream, and its footer.
     const std::string ape =
         file.substr(20'000, 4000) + "APETAGEX\xD0\7\0\0\xC0\x0F\0\0"s + support::zeros(16);
     const std::string id3v1 = "TAG" + support::zeros(125);
     const struct {
         std::string contents;
-        samples wanted;
+        samples expected;
     } tagged[] = {
-        {id3v2 + id3v2 + file.substr(0, 30) + file + ape + id3v1, plain},  // a lone header
+        {id3v2 + id3v2 + file.substr(0, 30) + file + ape + id3v1,
+         plain},  // starts with a single header
         {id3v2 + load(fixture("golden/plain.aac")), read_all(fixture("golden/plain.aac"))},
         {id3v2 + load(fixture("song.flac")) + id3v1, read_all(fixture("song.wav"))},
-        {ogg + ogg, read_all(fixture("golden/plain.ogg"))},  // not the second stream
+        {ogg + ogg, read_all(fixture("golden/plain.ogg"))},  // only the first stream
     };
     for (const auto &each : tagged) {
         SCOPED_TRACE(&each - tagged);
-        expect_same(read_all(save("tagged", each.contents)), each.wanted);
+        expect_equal(read_all(save("tagged", each.contents)), each.expected);
     }
 }
 
-// Other codecs, and files that have nothing of a format but its first bytes.
+// Other codecs, and files that have only the first bytes of a format.
 TEST(Reader, RefusesOtherCodecsAndNoise) {
-    EXPECT_EQ(opened(fixture("alac.m4a")).error, -3);
-    EXPECT_EQ(opened(fixture("silent.mp4")).error, -7);
-    EXPECT_EQ(opened(fixture("opus.ogg")).error, -7);
+    EXPECT_EQ(open_source(fixture("alac.m4a")).error, -3);
+    EXPECT_EQ(open_source(fixture("silent.mp4")).error, -7);
+    EXPECT_EQ(open_source(fixture("opus.ogg")).error, -7);
     for (const std::string head :
          {"", "RIFF....WAVEfmt ", "fLaC", "....ftyp", "OggS", "ADIF", "ID3"}) {
         for (const char fill : {'\0', '\x55', '\xFF'}) {
             const std::string file = save("noise", head + std::string(100'000 - head.size(), fill));
-            EXPECT_EQ(opened(file).source, nullptr) << head;
+            EXPECT_EQ(open_source(file).source, nullptr) << head;
         }
     }
 }

@@ -1,4 +1,4 @@
-// libwexaaudio.so as a library: its decoders called directly, the shared object that it loads, and
+// libwexaaudio.so as a library: direct calls of its decoders, the shared object that it loads, and
 // the scans that its readers share.
 #include <dlfcn.h>
 
@@ -13,37 +13,17 @@ namespace {
 
 using namespace std::string_literals;
 
-// The readers have decoded already: a decoder copies its input, in the one configuration of its
-// reader. Only Vorbis accepts set-up data, and only with its mark.
-TEST(Decoder, SupportsOneConfiguration) {
-    const wexa_config three_bytes = {1, 2, 3, 0}, mono = {1, 1, 2, 0};
-    EXPECT_EQ(xflacd_create(&three_bytes, nullptr), nullptr);
-    EXPECT_EQ(xflacd_create(&mono, nullptr), nullptr);
-    void *decoder = xvorbisd_create(&mono, nullptr);
-    wexa_frame frame = {};
-    wexa_output output = {};
-    wexa_status status = {};
-    for (uint8_t mark : {uint8_t{1}, uint8_t{2}}) {
-        frame.data = &mark;
-        frame.bytes = 1;
-        EXPECT_EQ(xvorbisd_decode(decoder, &frame, &output, &status) == 0, mark == 2);
-        EXPECT_NE(xflacd_decode(decoder, &frame, &output, &status), 0);
-        EXPECT_EQ(status.produced, 0);
-    }
-    xvorbisd_delete(decoder);
-}
-
 bool has_libavcodec() {
     return load("/proc/self/maps").find("libavcodec") != std::string::npos;
 }
 
-// WAV and FLAC do without libavcodec; the first four sources that need it open at once. If
-// libavcodec is loaded already, in a process of its own.
+// WAV and FLAC do not need libavcodec. Four sources that do open at the same time. If libavcodec is
+// loaded already, the test runs in a new process.
 TEST(Library, LoadsLibavcodecWhenNeeded) {
     if (has_libavcodec()) {
         const std::string self = std::filesystem::read_symlink("/proc/self/exe");
-        const std::string again = "'" + self + "' --gtest_filter=*LoadsLibavcodec* >/dev/null";
-        EXPECT_EQ(std::system(again.c_str()), 0);
+        const std::string command = "'" + self + "' --gtest_filter=*LoadsLibavcodec* >/dev/null";
+        EXPECT_EQ(std::system(command.c_str()), 0);
         return;
     }
     for (const char *name : {"song.wav", "song.flac"}) {
@@ -58,8 +38,8 @@ TEST(Library, LoadsLibavcodecWhenNeeded) {
     EXPECT_TRUE(has_libavcodec());
 }
 
-// A copy of the library without its shared object in the same folder.
-TEST(Library, LogsAMissingObject) {
+// A copy of the library in a folder without the shared object.
+TEST(Library, LogsAMissingSharedObject) {
     Dl_info info = {};
     ASSERT_NE(dladdr(reinterpret_cast<void *>(xaac_init), &info), 0);
     const std::string copy = save("libwexaaudio.so", load(info.dli_fname));
@@ -71,17 +51,17 @@ TEST(Library, LogsAMissingObject) {
         ASSERT_NE(init, nullptr);
         EXPECT_EQ(init() == 0, strcmp(name, "xflac_init") == 0) << name;
     }
-    const std::string said = testing::internal::GetCapturedStderr();
-    EXPECT_EQ(said.compare(0, 12, "E/wexaaudio:"), 0) << said;
-    EXPECT_NE(said.find("libwexaaudio_av.so"), std::string::npos) << said;
+    const std::string log = testing::internal::GetCapturedStderr();
+    EXPECT_EQ(log.compare(0, 12, "E/wexaaudio:"), 0) << log;
+    EXPECT_NE(log.find("libwexaaudio_av.so"), std::string::npos) << log;
     dlclose(library);
 }
 
-// A file is scanned once, its tags included, and again after it was replaced. The scan is kept for
+// A file and its tags are scanned once, and again after the file was replaced. The scan stays for
 // the next reader, unless the file was written just before.
 TEST(ScanCache, ScansAFileOnce) {
     static int64_t bytes_read;
-    std::string tags;  // each of 32 bytes, after the audio
+    std::string tags;  // 32 bytes each, after the audio
     for (int i = 0; i < 5000; ++i) tags += "APETAGEX\xD0\7\0\0 \0\0\0"s + support::zeros(16);
     std::string path = save("shared.mp3", load(fixture("cbr.mp3")) + tags);
     const auto size = static_cast<int64_t>(load(path).size());
@@ -105,11 +85,11 @@ TEST(ScanCache, ScansAFileOnce) {
     EXPECT_LT(bytes_read, size * 5 / 4);
     void *second = open();
     EXPECT_EQ(bytes_read, 0);
-    EXPECT_EQ(info.duration, opened(fixture("cbr.mp3")).format.duration);
+    EXPECT_EQ(info.duration, open_source(fixture("cbr.mp3")).format.duration);
     save("shared.mp3", load(fixture("mono.mp3")));
     void *third = open();
     EXPECT_GT(bytes_read, 0);
-    EXPECT_EQ(info.duration, opened(fixture("mono.mp3")).format.duration);
+    EXPECT_EQ(info.duration, open_source(fixture("mono.mp3")).format.duration);
     for (void *reader : {first, second, third}) xmp123fd_delete(reader);
     for (const bool fresh : {true, false}) {
         if (!fresh) path = fixture("cbr.mp3");

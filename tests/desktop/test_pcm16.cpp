@@ -9,13 +9,13 @@
 
 namespace {
 
-int16_t plain(float sample) {
+int16_t convert(float sample) {
     if (std::isnan(sample)) return 0;
     return static_cast<int16_t>(std::lrint(std::clamp(sample * 32768.0f, -32768.0f, 32767.0f)));
 }
 
-// A sample of all bit patterns, infinities and NaN among them, and all halves between two integers.
-TEST(Pcm16, ConvertsAsRoundingOneByOne) {
+// A sample of all bit patterns, including infinities and NaN, and all halves between two integers.
+TEST(Pcm16, EqualsRoundingOneByOne) {
     constexpr uint64_t kStep = 9973;
     std::vector<float> left;
     for (uint64_t bits = 0; bits <= UINT32_MAX; bits += kStep) {
@@ -36,7 +36,7 @@ TEST(Pcm16, ConvertsAsRoundingOneByOne) {
     for (int32_t channels = 1; channels <= 3; ++channels) {
         pcm16_mean(planes, channels, 1, mean.data(), count - 1);
         for (size_t i = 1; i < left.size(); ++i) {
-            const int l = plain(left[i]), r = plain(right[i]);
+            const int l = convert(left[i]), r = convert(right[i]);
             ASSERT_EQ(pairs[2 * i], l) << left[i];
             ASSERT_EQ(pairs[2 * i + 1], r) << right[i];
             const int sum = channels == 1 ? l : channels == 2 ? l + r : l + r + l;

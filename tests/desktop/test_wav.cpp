@@ -6,29 +6,29 @@ namespace {
 
 using namespace std::string_literals;
 
-constexpr size_t kFormat = 12;  // offsets in a plain header: of the format
-constexpr size_t kData = 36;    // of the data
+constexpr size_t kFormat = 12;  // offset of the format in a plain header
+constexpr size_t kData = 36;    // offset of the data
 
-samples numbers(size_t count) {
+samples make_samples(size_t count) {
     samples pcm(count);
     for (size_t i = 0; i < count; ++i) pcm[i] = static_cast<int16_t>(i * 7919);
     return pcm;
 }
 
-// The file with another number of so many bytes at an offset.
-std::string patched(std::string file, size_t at, uint64_t value, size_t size = 2) {
+// Returns the file with the number of size bytes at an offset replaced.
+std::string patch(std::string file, size_t at, uint64_t value, size_t size = 2) {
     return file.replace(at, size, reinterpret_cast<const char *>(&value), size);  // little-endian
 }
 
-TEST(Wav, ReadsEveryShapeOfHeader) {
-    const samples pcm = numbers(60000);
+TEST(Wav, ReadsUnusualHeaders) {
+    const samples pcm = make_samples(60000);
     const std::string file = support::wav_bytes(pcm, 44100, 2), data = file.substr(kData);
-    const auto with_size = [&](uint64_t bytes) { return patched(file, kData + 4, bytes, 4); };
-    // 22 bytes more: 16 bits in use, no speakers, PCM.
+    const auto with_size = [&](uint64_t bytes) { return patch(file, kData + 4, bytes, 4); };
+    // 22 more bytes: 16 bits in use, no speakers, PCM.
     const std::string extension = "\26\0\20\0\0\0\0\0\1\0\0\0\0\0\20\0\x80\0\0\xAA\0\x38\x9B\x71"s;
     const std::string plain = file.substr(0, kData);
-    const std::string format = patched(patched(plain, kFormat + 8, 0xFFFE), kFormat + 4, 40);
-    // The odd bodies spell "data": a reader that forgets the padding finds a false chunk.
+    const std::string format = patch(patch(plain, kFormat + 8, 0xFFFE), kFormat + 4, 40);
+    // The bodies of odd length spell "data": a reader that ignores the padding finds a false chunk.
     const std::string odd = "LIST\15\0\0\0INFOdata\1\0\0\0\7\0JUNK\5\0\0\0ddddd\0"s;
     const struct {
         const char *name;
@@ -51,54 +51,55 @@ TEST(Wav, ReadsEveryShapeOfHeader) {
     };
     for (const auto &each : shapes) {
         SCOPED_TRACE(each.name);
-        const opened source(save("shape.wav", each.contents));
+        const open_source source(save("shape.wav", each.contents));
         ASSERT_NE(source.source, nullptr);
         EXPECT_EQ(static_cast<size_t>(source.format.channels), each.channels);
         EXPECT_EQ(static_cast<size_t>(source.format.duration * 44100 / kUnits), each.frames);
         samples first(each.frames);
         for (size_t i = 0; i < each.frames; ++i) first[i] = pcm[i * each.channels];
-        expect_same(read(source.source), first);
+        expect_equal(read(source.source), first);
     }
 }
 
-// If the header is readable, an unusable format is distinguished from unusable data.
-TEST(Wav, RefusesWhatTheSourceCannotUse) {
-    const std::string file = support::wav_bytes(numbers(2000), 44100, 2);
-    const auto coded = [&](uint64_t tag, uint64_t bits) {
-        return patched(patched(file, kFormat + 8, tag), kFormat + 22, bits);
+// If the header is readable, an unusable format has a different code from unusable data.
+TEST(Wav, RefusesUnsupportedFormats) {
+    const std::string file = support::wav_bytes(make_samples(2000), 44100, 2);
+    const auto with_format = [&](uint64_t tag, uint64_t bits) {
+        return patch(patch(file, kFormat + 8, tag), kFormat + 22, bits);
     };
     const struct {
         std::string contents;
         int32_t error;
     } refusals[] = {
-        {coded(1, 8), -3},
-        {coded(1, 24), -3},
-        {coded(3, 32), -3},    // float
-        {coded(7, 8), -3},     // mu-law
-        {coded(300, 16), -3},  // the interface's own code for linear PCM
+        {with_format(1, 8), -3},
+        {with_format(1, 24), -3},
+        {with_format(3, 32), -3},    // float
+        {with_format(7, 8), -3},     // mu-law
+        {with_format(300, 16), -3},  // the interface's own code for linear PCM
         {file.substr(0, kData), -7},
-        {patched(file, kFormat + 10, 0), -3},     // no channels
-        {patched(file, kFormat + 12, 0, 4), -3},  // no rate
+        {patch(file, kFormat + 10, 0), -3},     // no channels
+        {patch(file, kFormat + 12, 0, 4), -3},  // no rate
         {file.substr(0, kFormat + 20), -3},
     };
     for (const auto &each : refusals) {
-        EXPECT_EQ(opened(save("refused.wav", each.contents)).error, each.error) << &each - refusals;
+        EXPECT_EQ(open_source(save("refused.wav", each.contents)).error, each.error)
+            << &each - refusals;
     }
 }
 
 TEST(Wav, SeeksToWholeSeconds) {
-    const samples pcm = numbers(22051);  // one sample beyond 2 s
-    const opened file(save("seek.wav", support::wav_bytes(pcm, 11025, 1)));
+    const samples pcm = make_samples(22051);  // one sample past 2 s
+    const open_source file(save("seek.wav", support::wav_bytes(pcm, 11025, 1)));
     ASSERT_NE(file.source, nullptr);
-    const std::pair<int64_t, int64_t> landings[] = {{19'999'999, 11025}, {0, 0},
-                                                    {20'000'000, 22050}, {30'000'000, 22051},
-                                                    {INT64_MAX, 22051},  {-50'000'000, 0}};
-    for (const auto &[units, sample] : landings) {
+    const std::pair<int64_t, int64_t> seeks[] = {{19'999'999, 11025}, {0, 0},
+                                                 {20'000'000, 22050}, {30'000'000, 22051},
+                                                 {INT64_MAX, 22051},  {-50'000'000, 0}};
+    for (const auto &[units, sample] : seeks) {
         SCOPED_TRACE(units);
         int64_t reached = -1;
         ASSERT_EQ(mtsrc_seekstream(file.source, units, &reached), 0);
         EXPECT_EQ(reached * 11025 / kUnits, sample);
-        expect_same(read(file.source), {pcm.begin() + sample, pcm.end()});
+        expect_equal(read(file.source), {pcm.begin() + sample, pcm.end()});
     }
 }
 

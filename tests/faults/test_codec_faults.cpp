@@ -1,5 +1,5 @@
-// Every value that the codec library returns is made wrong at every call, once and from there on,
-// and a job runs in every mode: it is refused or reports once, nothing leaks or hangs.
+// Replaces every value that the codec library returns, in one call or in all calls from one on, and
+// runs a job in every mode. The file is refused or the job reports once; nothing leaks or hangs.
 #include <sys/resource.h>
 #include <unistd.h>
 
@@ -12,7 +12,7 @@
 #include "tests/support/job_harness.h"
 #include "tests/support/song.h"
 
-// Claims of more memory than there is are refused, not fatal.
+// An allocation that exceeds the memory fails instead of ending the program.
 extern "C" const char *__asan_default_options() {
     return "allocator_may_return_null=1:max_allocation_size_mb=512";
 }
@@ -22,15 +22,15 @@ extern "C" const char *__tsan_default_options() {
 
 namespace {
 
-constexpr unsigned kLongest = 30;  // seconds of one job
-constexpr long kMostMib = 256;
+constexpr unsigned kMaxSeconds = 30;  // of one job
+constexpr long kMaxMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
-// The quick tier tries this many calls of a value, and one in so many of the answers there.
+// A quick run tests kCalls calls of each value, and in each call only every kStep-th replacement.
 constexpr int kCalls = 2, kStep = 31;
 
-// The replacements of each value: general ones, and those close to a limit of its own.
-std::vector<int64_t> answers_for(const std::string &value) {
-    static std::map<std::string, std::vector<int64_t>> all = {
+// Replacements for a value: those near its own limits, and general ones.
+std::vector<int64_t> replacements_for(const std::string &value) {
+    static std::map<std::string, std::vector<int64_t>> near_limits = {
         {"bytes", {16'384, 16'385, 131'071, 1'048'576, 1'048'577}},
         {"reached", {9'999'999, 159'999'999, 160'000'000, -10'000'000}},
         {"rate", {7999, 8001, 11'025, 48'001, 192'001}},
@@ -39,120 +39,121 @@ std::vector<int64_t> answers_for(const std::string &value) {
         {"count", {17, 65}},
         {"duration",
          {9'999'999, 10'000'000, 10'000'001, 50'000'000, 50'000'001, INT64_MAX / 16'000}}};
-    std::vector<int64_t> answers = all[value];
-    answers.insert(answers.end(), {-1, 0, 1, 2, 3, 255, 65'536, 1 << 20, INT32_MAX, INT32_MIN,
-                                   1LL << 40, INT64_MAX, INT64_MIN});
-    return answers;
+    std::vector<int64_t> replacements = near_limits[value];
+    replacements.insert(replacements.end(), {-1, 0, 1, 2, 3, 255, 65'536, 1 << 20, INT32_MAX,
+                                             INT32_MIN, 1LL << 40, INT64_MAX, INT64_MIN});
+    return replacements;
 }
 
-using place = std::pair<std::string, std::string>;  // function and value
+using value_id = std::pair<std::string, std::string>;  // function and value
 
-// The fault of the current run. The hook runs under the fake library's lock; between runs no
-// other thread is alive.
+// The fault of the current run. It is used with the fake library's lock held; between runs no other
+// thread exists.
 struct fault {
-    place where = {};
-    int64_t call = -1;
-    int64_t answer = 0;
-    bool ever = false;
-    bool struck = false;
-    std::map<place, int64_t> calls = {};
-} now;
+    value_id id = {};
+    int64_t call = -1;  // index of the first wrong call
+    int64_t replacement = 0;
+    bool persistent = false;  // all later calls are wrong too
+    bool applied = false;
+    std::map<value_id, int64_t> calls = {};
+} current_fault;
 
-int64_t hand_back(const std::string &function, const std::string &value, int64_t truth) {
-    const place here = {function, value};
-    const int64_t call = now.calls[here]++;
-    const bool wrong = here == now.where && (now.ever ? call >= now.call : call == now.call);
-    if (!wrong) return truth;
-    now.struck = now.struck || now.answer != truth;
-    return now.answer;
+int64_t apply_fault(const std::string &function, const std::string &value, int64_t original) {
+    fault &now = current_fault;
+    const value_id id = {function, value};
+    const int64_t call = now.calls[id]++;
+    const bool wrong = id == now.id && (now.persistent ? call >= now.call : call == now.call);
+    if (!wrong) return original;
+    now.applied = now.applied || now.replacement != original;
+    return now.replacement;
 }
 
-// PCM cut into frames, each starting at its time. A little longer than there is: the end is
-// reached.
-scripted::script script_of(const support::song &song) {
-    scripted::script made;
-    made.sample_rate = song.plan.rate;
-    made.channels = song.plan.channels;
+// The song's PCM as frames, each with its start time. The stated duration is longer than the song,
+// so that jobs reach the end of the stream.
+fake_codec::stream_spec stream_of(const support::song &song) {
+    fake_codec::stream_spec stream;
+    stream.sample_rate = song.plan.rate;
+    stream.channels = song.plan.channels;
     const auto samples = static_cast<int64_t>(song.pcm.size());
-    const int64_t second = made.sample_rate * made.channels;
-    made.duration = samples * kUnitsPerSecond / second + kUnitsPerSecond / 2;
+    const int64_t second = stream.sample_rate * stream.channels;
+    stream.duration = samples * kUnitsPerSecond / second + kUnitsPerSecond / 2;
     for (int64_t at = 0; at < samples; at += kFrame) {
         const int64_t end = std::min(samples, at + kFrame);
-        made.frames.push_back(
+        stream.frames.push_back(
             {{song.pcm.begin() + at, song.pcm.begin() + end}, at * kUnitsPerSecond / second});
     }
-    return made;
+    return stream;
 }
 
-char current[256];  // the run that hangs
+char current_run[256];  // printed if the run hangs
 
 class CodecFaults : public testing::TestWithParam<std::string> {
  protected:
     // Runs one job with the fault. Returns true if all promises hold.
     bool run(int32_t mode) {
-        scripted::all = {};
-        scripted::all.use(script);
-        scripted::all.tamper = hand_back;
+        fake_codec::state = {};
+        fake_codec::state.streams.push_back(stream);
+        fake_codec::state.replace = apply_fault;
         int32_t err = 99;
         TAVO_CTX *ctx = job::create(file.path, mode, &err);
         bool good = err == TAVO_ERR_HANDLE && job::last.calls == 0;
         if (ctx != nullptr) {
             good = err == TAVO_OK && tavo_analyze(ctx, 0, 0, 0) == TAVO_OK;
             job::wait();
-            good = tavo_deinit(ctx) == TAVO_OK && !job::flaw_of(job::last, mode) && good;
+            good = tavo_deinit(ctx) == TAVO_OK && !job::find_inconsistency(job::last, mode) && good;
         }
-        return good && scripted::all.alive.empty() && scripted::tags_are_empty() &&
-               scripted::all.faults.empty();
+        return good && fake_codec::state.objects.empty() && fake_codec::tags_are_empty() &&
+               fake_codec::state.misuses.empty();
     }
 
-    void strike(const place &where, int64_t call, int32_t mode) {
+    void try_replacements(const value_id &id, int64_t call, int32_t mode) {
         static const char *all = getenv("TAVO_FAULTS");
-        for (const int64_t answer : answers_for(where.second)) {
-            for (const bool ever : {false, true}) {
-                if (all == nullptr && turn++ % kStep != 0) continue;
-                now = {where, call, answer, ever};
-                snprintf(current, sizeof current, "%s %s %s=%lld at call %lld%s in mode %d\n",
-                         GetParam().c_str(), where.first.c_str(), where.second.c_str(),
-                         static_cast<long long>(answer), static_cast<long long>(call),
-                         ever ? " and on" : "", mode);
-                alarm(kLongest);
-                EXPECT_TRUE(run(mode)) << current;
-                struck += now.struck ? 1 : 0;
+        for (const int64_t replacement : replacements_for(id.second)) {
+            for (const bool persistent : {false, true}) {
+                if (all == nullptr && tried++ % kStep != 0) continue;
+                current_fault = {id, call, replacement, persistent};
+                snprintf(current_run, sizeof current_run,
+                         "%s %s %s=%lld at call %lld%s in mode %d\n", GetParam().c_str(),
+                         id.first.c_str(), id.second.c_str(), static_cast<long long>(replacement),
+                         static_cast<long long>(call), persistent ? " and later" : "", mode);
+                alarm(kMaxSeconds);
+                EXPECT_TRUE(run(mode)) << current_run;
+                applied += current_fault.applied ? 1 : 0;
             }
         }
     }
 
     const support::temporary_file file{"codec_faults"};
-    scripted::script script;
-    int turn = 0, struck = 0;
+    fake_codec::stream_spec stream;
+    int tried = 0, applied = 0;
 };
 
-TEST_P(CodecFaults, AreSurvived) {
-    const int32_t channels = GetParam() == "ogg" ? 1 : 2;  // what the decoder is asked for
-    script = script_of(support::make_song({8000, channels, 15.5, 120.0, 1, 6.0, 15.0}));
+TEST_P(CodecFaults, JobIsRefusedOrReportsOnce) {
+    const int32_t channels = GetParam() == "ogg" ? 1 : 2;  // of the decoder's output
+    stream = stream_of(support::make_song({8000, channels, 15.5, 120.0, 1, 6.0, 15.0}));
     const source_row &row = row_of(GetParam());
-    if (row.tag != 0) script.codec = row.tag;
+    if (row.tag != 0) stream.codec = row.tag;
     std::ofstream(file.path) << row.file;
     signal(SIGALRM, [](int) {
-        (void)!write(STDERR_FILENO, current, strlen(current));
+        (void)!write(STDERR_FILENO, current_run, strlen(current_run));
         _exit(3);
     });
     for (const int32_t mode : {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH}) {
-        now = fault{};
+        current_fault = fault{};
         ASSERT_TRUE(run(mode) && job::last.status == 0) << mode;
         EXPECT_EQ(job::last.hl_pos > 1000, mode != TAVO_MODE_BEATS);  // so that mode 2 seeks
-        const std::map<place, int64_t> calls = now.calls;
-        for (const auto &[where, times] : calls) {
-            const int64_t step = std::max<int64_t>(1, times / kCalls);
-            for (int64_t call = 0; call < times; call += step) strike(where, call, mode);
+        const std::map<value_id, int64_t> calls = current_fault.calls;
+        for (const auto &[id, count] : calls) {
+            const int64_t step = std::max<int64_t>(1, count / kCalls);
+            for (int64_t call = 0; call < count; call += step) try_replacements(id, call, mode);
         }
     }
     alarm(0);
-    EXPECT_GT(struck, 50);
+    EXPECT_GT(applied, 50);
     rusage used = {};
     getrusage(RUSAGE_SELF, &used);
-    // Sanitizers touch what is only reserved.
-    EXPECT_TRUE(CODEC_FAULTS_SANITIZED || used.ru_maxrss / 1024 < kMostMib) << used.ru_maxrss;
+    // Sanitizers also use memory that is only reserved.
+    EXPECT_TRUE(CODEC_FAULTS_SANITIZED || used.ru_maxrss / 1024 < kMaxMib) << used.ru_maxrss;
 }
 
 INSTANTIATE_TEST_SUITE_P(Formats, CodecFaults,

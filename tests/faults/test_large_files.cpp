@@ -1,5 +1,5 @@
-// WAV files beyond 2 and 4 GiB, nearly all of them holes: positions and lengths of more than 31 and
-// 32 bits. Their jobs, which read all of it, run with TAVO_FAULTS=all and take 10 GiB of memory.
+// Sparse WAV files larger than 2 and 4 GiB: positions and lengths of more than 31 and 32 bits.
+// Their jobs, which read everything, only run with TAVO_FAULTS=all and need 10 GiB of memory.
 #include <cstring>
 
 #include "tests/desktop/codec_test.h"
@@ -11,7 +11,7 @@ namespace {
 constexpr int64_t kGiB = int64_t{1} << 30;
 constexpr int64_t kRate = 48'000;
 
-// Its last second has samples of 1000. The sizes in the header saturate.
+// The last second consists of samples of 1000. Sizes that do not fit the header are all ones.
 std::string sparse_wav(int32_t channels, int64_t seconds) {
     const auto second = static_cast<size_t>(kRate * channels);
     std::string file = support::wav_bytes(std::vector<int16_t>(second, 1000), kRate, channels);
@@ -26,12 +26,12 @@ std::string sparse_wav(int32_t channels, int64_t seconds) {
     return path;
 }
 
-TEST(LargeFiles, Beyond2And4GiB) {
+TEST(LargeFiles, OffsetsExceed31And32Bits) {
     constexpr int64_t kUnits = codec_test::kUnits;
     for (const int64_t gib : {2, 4}) {
         const int64_t seconds = gib * kGiB / (kRate * 8 * 2) + 2;
         const std::string path = sparse_wav(8, seconds);
-        const codec_test::opened file(path);
+        const codec_test::open_source file(path);
         ASSERT_NE(file.source, nullptr) << file.error;
         EXPECT_EQ(file.format.duration, seconds * kUnits);
         int64_t reached = -1;

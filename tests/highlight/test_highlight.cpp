@@ -1,5 +1,5 @@
 // Curves and PCM of constant levels, written as pairs of a count and a value. The largest point of
-// a curve (2 s each) is 1, so the values are already normalised.
+// each curve (2 s per point) is 1, so the values are normalised.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -19,7 +19,7 @@
 
 namespace {
 
-// 10 log10(mean square + 1) of the window samples at pcm, full scale 1.
+// 10 log10(mean square + 1) of window samples, with full scale 1.
 float plain_power(const int16_t *pcm, int64_t window) {
     double sum = 0.0;
     for (int64_t i = 0; i < window; ++i) sum += (pcm[i] / 32767.0) * (pcm[i] / 32767.0);
@@ -31,7 +31,7 @@ using indexes = std::vector<int32_t>;
 constexpr int32_t kSlow = 100;  // Hz; the curve does not depend on the rate
 constexpr int32_t kRate = 8000;
 
-std::vector<float> runs(const std::string &pairs) {
+std::vector<float> expand(const std::string &pairs) {
     std::vector<float> power;
     std::istringstream in(pairs);
     float value = 0.0f;
@@ -39,11 +39,11 @@ std::vector<float> runs(const std::string &pairs) {
     return power;
 }
 
-// PCM that alternates in sign, unit samples for each point, whose mean square (full scale 1) is
-// about the value.
-std::vector<int16_t> levels(const std::string &pairs, int64_t unit) {
+// PCM with alternating signs, unit samples per point. The value is about its mean square, with full
+// scale 1.
+std::vector<int16_t> make_pcm(const std::string &pairs, int64_t unit) {
     std::vector<int16_t> pcm;
-    for (const float square : runs(pairs)) {
+    for (const float square : expand(pairs)) {
         const double peak = std::round(32767.0 * std::sqrt(static_cast<double>(square)));
         for (int64_t i = 0; i < unit; ++i)
             pcm.push_back(static_cast<int16_t>(i % 2 == 0 ? peak : -peak));
@@ -51,7 +51,7 @@ std::vector<int16_t> levels(const std::string &pairs, int64_t unit) {
     return pcm;
 }
 
-std::vector<float> curve(const std::vector<int16_t> &pcm) {
+std::vector<float> compute_curve(const std::vector<int16_t> &pcm) {
     TAVO_HL_CTX hl = {0, nullptr, 77, 0};
     const auto samples = static_cast<int64_t>(pcm.size());
     const int32_t count = _calc_power_level(pcm.data(), samples, kSlow, &hl);
@@ -63,13 +63,14 @@ std::vector<float> curve(const std::vector<int16_t> &pcm) {
 }
 
 uint32_t search(const std::string &curve, int32_t duration_s, int32_t hl_param = 0) {
-    std::vector<float> power = runs(curve);
+    std::vector<float> power = expand(curve);
     TAVO_HL_CTX hl = {hl_param, power.data(), static_cast<int32_t>(power.size()), 0};
     return _get_HL_simple(&hl, duration_s);
 }
 
-// The valleys of 50 points, of which those in dips have the value depth.
-indexes valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f, float std = 0.125f) {
+// Returns the valleys of 50 points, which have the value depth at dips and 1 elsewhere.
+indexes find_valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f,
+                     float std = 0.125f) {
     std::vector<float> values(50, 1.0f);
     for (const int32_t at : dips) values[static_cast<size_t>(at)] = depth;
     indexes out(15);
@@ -78,16 +79,17 @@ indexes valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f, floa
     return out;
 }
 
-// The tuned start of PCM in steps of 0.4 s from 3 s before the start on.
-uint32_t tuned(const std::string &steps, int32_t rate = kRate, uint32_t start_ms = 3000,
-               uint32_t duration_s = 60) {
-    std::vector<int16_t> pcm = levels(steps, rate * 2 / 5);
+// Returns the tuned start of PCM in steps of 0.4 s, the first 3 s before the coarse start.
+uint32_t tune(const std::string &steps, int32_t rate = kRate, uint32_t start_ms = 3000,
+              uint32_t duration_s = 60) {
+    std::vector<int16_t> pcm = make_pcm(steps, rate * 2 / 5);
     pcm.insert(pcm.begin(), (start_ms - 3000) * static_cast<size_t>(rate) / 1000, int16_t{0});
     return _tune_HL_simple(pcm.data(), rate, start_ms, duration_s);
 }
 
-// The start of a song whose buffer ends with the PCM; a second search replaces the curve.
-uint32_t position(std::vector<int16_t> pcm, int64_t duration_s, int32_t count) {
+// Returns the start found in a song whose buffer ends with the PCM. A second search replaces the
+// curve.
+uint32_t find_position(std::vector<int16_t> pcm, int64_t duration_s, int32_t count) {
     pcm.shrink_to_fit();
     TAVO_CTX ctx = {};
     ctx.pcm = pcm.data();
@@ -106,10 +108,11 @@ uint32_t position(std::vector<int16_t> pcm, int64_t duration_s, int32_t count) {
 
 }  // namespace
 
-TEST(PowerEnvelope, OneValuePerTwoSecondsFromSixOn) {
+TEST(PowerEnvelope, HasOneValueEveryTwoSeconds) {
     for (const auto &[samples, count] : std::vector<std::pair<size_t, size_t>>{
              {0, 0}, {599, 0}, {600, 1}, {799, 1}, {800, 2}, {18000, 88}})
-        EXPECT_EQ(curve(std::vector<int16_t>(samples)), std::vector<float>(count)) << samples;
+        EXPECT_EQ(compute_curve(std::vector<int16_t>(samples)), std::vector<float>(count))
+            << samples;
     TAVO_HL_CTX hl = {};
     for (const int32_t rate : {0, -1, INT32_MIN, INT32_MAX})
         EXPECT_EQ(_calc_power_level(nullptr, 1000, rate, &hl), 0) << rate;
@@ -118,20 +121,21 @@ TEST(PowerEnvelope, OneValuePerTwoSecondsFromSixOn) {
     EXPECT_EQ(hl.power, nullptr);
 }
 
-// Full power, and two silent seconds, two at a quarter of it, two at full: (0 + 1/4 + 1) / 3.
+// Full power; then two seconds each of silence, a quarter and full power: (0 + 1/4 + 1) / 3.
 TEST(PowerEnvelope, IsTenLogOfMeanSquarePlusOne) {
-    EXPECT_EQ(curve(levels("800 1", 1)), std::vector<float>(2, 10.0f * log10f(2.0f)));
-    EXPECT_NEAR(curve(levels("1 0 1 .25 1 1", 200))[0], 10.0 * log10(1.0 + 1.25 / 3.0), 1e-4);
+    EXPECT_EQ(compute_curve(make_pcm("800 1", 1)), std::vector<float>(2, 10.0f * log10f(2.0f)));
+    EXPECT_NEAR(compute_curve(make_pcm("1 0 1 .25 1 1", 200))[0], 10.0 * log10(1.0 + 1.25 / 3.0),
+                1e-4);
 }
 
-// Odd and even numbers of windows: the parts summed in parallel share one window or none.
-TEST(PowerEnvelope, EqualsEachWindowSummedAlone) {
+// Odd and even numbers of windows: the two sections share one window or none.
+TEST(PowerEnvelope, EqualsEachWindowSummedSeparately) {
     std::mt19937 random(11);
     for (int64_t windows = 1; windows <= 9; ++windows) {
         const int64_t samples = (windows + 2) * 2 * kSlow + windows * 13 % (2 * kSlow);
         std::vector<int16_t> pcm(static_cast<size_t>(samples));
         for (int16_t &x : pcm) x = static_cast<int16_t>(random());
-        const std::vector<float> values = curve(pcm);
+        const std::vector<float> values = compute_curve(pcm);
         ASSERT_EQ(values.size(), static_cast<size_t>(windows));
         for (size_t k = 0; k < values.size(); ++k) {
             EXPECT_EQ(values[k], plain_power(pcm.data() + 2 * kSlow * k, 6 * kSlow)) << k;
@@ -142,23 +146,24 @@ TEST(PowerEnvelope, EqualsEachWindowSummedAlone) {
     }
 }
 
-// Above a mean of 0.5 a dip must be 1.5 deviations below it, otherwise one: 0.375 in both cases.
+// If the mean is above 0.5, a dip must be 1.5 deviations below it, otherwise one: below 0.375 in
+// both cases.
 TEST(Valleys, AreTheEndsOfQuietStretches) {
-    EXPECT_EQ(valleys({5}, 0.375f, 0.75f, 0.25f), indexes{});
-    EXPECT_EQ(valleys({5}, 0.34375f, 0.75f, 0.25f), indexes{5});
-    EXPECT_EQ(valleys({5}, 0.34375f), indexes{5});
-    EXPECT_EQ(valleys({}), indexes{});
-    EXPECT_EQ(valleys({0}), indexes{0});
-    EXPECT_EQ(valleys({0, 10}), indexes{10});
-    EXPECT_EQ(valleys({0, 1, 5, 6, 12}), (indexes{1, 6, 12}));
-    EXPECT_EQ(valleys({4, 6, 9}), (indexes{6, 9}));
+    EXPECT_EQ(find_valleys({5}, 0.375f, 0.75f, 0.25f), indexes{});
+    EXPECT_EQ(find_valleys({5}, 0.34375f, 0.75f, 0.25f), indexes{5});
+    EXPECT_EQ(find_valleys({5}, 0.34375f), indexes{5});
+    EXPECT_EQ(find_valleys({}), indexes{});
+    EXPECT_EQ(find_valleys({0}), indexes{0});
+    EXPECT_EQ(find_valleys({0, 10}), indexes{10});
+    EXPECT_EQ(find_valleys({0, 1, 5, 6, 12}), (indexes{1, 6, 12}));
+    EXPECT_EQ(find_valleys({4, 6, 9}), (indexes{6, 9}));
     indexes many;
     for (int32_t at = 1; at < 50; at += 3) many.push_back(at);
-    EXPECT_EQ(valleys(many), indexes(many.begin(), many.begin() + 15));
+    EXPECT_EQ(find_valleys(many), indexes(many.begin(), many.begin() + 15));
 }
 
-// From 90 s on, edges count from point 9 on and up to 25 points before the end; below, from 0 and
-// up to 10.
+// In songs of 90 s and more, edges count from point 9 on and are scored up to 25 points before the
+// end; in shorter songs from 0 on and up to 10.
 TEST(Search, ReturnsTheBestEdge) {
     const struct {
         const char *curve;
@@ -166,53 +171,53 @@ TEST(Search, ReturnsTheBestEdge) {
         uint32_t ms;
     } cases[] = {
         {"20 0.4 10 0.9 1 1 19 0.9 10 0.4", 120, 38000},  // into the loud passage
-        // Edge at 14: 0.1 to 0.45 in one step, score 0.35 + 0.35. Edge at 28: a smaller step, 0.3,
-        // but from 0.225 on average to 0.65, score 0.425 + 0.3.
+        // Edge at 14: 0.1 to 0.45 in one step, score 0.35 + 0.35. Edge at 28: a smaller step of
+        // 0.3, but from 0.225 on average to 0.65, score 0.425 + 0.3.
         {"3 0.1 1 1 11 0.1 6 0.45 7 0.1 1 0.35 12 0.65 19 0.1", 120, 56000},
-        // Edge at 13: 0.5625 + 0.4375. Edge at 30: 0.5 + 0.5. All exact in binary; the larger step.
+        // Edge at 13: 0.5625 + 0.4375. Edge at 30: 0.5 + 0.5. Equal, so the larger step wins.
         {"3 0.125 1 1 9 0.125 1 0.375 7 0.8125 10 0.25 10 0.75 19 0.25", 120, 60000},
-        // A step of 0.3 back into the passage, from 0.8 to 0.75 on average, is no entry: the point
-        // after it, as the only edge. From 0.75 to 0.75 it is one.
+        // A step of 0.3 within the passage, from 0.8 to 0.75 on average, is not scored, so the
+        // answer is the point after the only edge. From 0.75 to 0.75 it is scored.
         {"5 0.25 10 1 1 0.6 1 0.9 20 0.6 23 0.25", 120, 32000},
         {"5 0.25 10 1 1 0.5 1 0.875 20 0.625 23 0.25", 120, 30000},
         // Four loud points after an edge are a passage, three are not, even if values at the mean
-        // of 0.25 follow, which is not above it.
+        // of 0.25 follow, because they are not above it.
         {"20 0.5 4 1 36 0.5", 120, 38000},
         {"20 0.5 3 1 37 0.5", 120, 40000},
         {"20 0 3 1 4 0.25 10 0 16 0.25 7 1", 120, 40000},
-        // The opening counts in short songs only.
+        // The opening counts only in short songs.
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 90, 60000},
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 89, 8000},
-        // One edge, at 5, inside the loud passage that is open from the start; the later rise has
-        // no strict maximum. Without the segment the answer would be the point after the edge.
+        // One edge, at 5, inside the loud passage that starts at 0; the later rise has no strict
+        // maximum. Without a segment the answer would be the point after the edge.
         {"6 0.75 24 1 11 0.25 1 0.5 1 0.75 8 0.875 9 0.25", 80, 10000},
-        // At the last scored point the edge itself is the answer; one later it is the point after
-        // the edge, as the last edge left when none passes; but an earlier edge does pass.
+        // At the last scored point the answer is the edge itself. One point later it is the point
+        // after the edge, because no other edge qualifies; but an earlier edge does.
         {"36 0.25 10 1 14 0.25", 90, 70000},
         {"37 0.25 10 1 13 0.25", 90, 74000},
         {"20 0.25 1 0.9 14 0.25 1 1 24 0.25", 90, 40000},
         {"51 0.25 5 1 4 0.25", 89, 100000},
         {"52 0.25 5 1 3 0.25", 89, 104000},
-        // Bursts of two points are too short to be scored: the first edge that no valley follows
-        // closely is taken, at the point after it. Dips below 0.336 are low points; the valley is
-        // the last of them: at 23, 3 after the edge at 20, or at 24.
+        // Bursts of two points are too short to be scored, so the answer is the point after the
+        // first edge that is not followed closely by a valley. Dips below 0.336 are low points, and
+        // the valley is the last of them: at 23, 3 after the edge at 20, or at 24.
         {"20 0.5 1 1 1 0.9 1 0.3 1 0.1 1 0.4 5 0.5 2 0.85 28 0.5", 120, 60000},
         {"20 0.5 1 1 1 0.9 1 0.5 1 0.3 1 0.1 1 0.4 4 0.5 2 0.85 28 0.5", 120, 40000},
-        // Of 100 values, 60 are below 0.8: the 60th percentile, which the largest step, at 29,
-        // reaches and the next one, at 41, exceeds.
+        // 60 of 100 values are below 0.8, the 60th percentile. The largest step, at 29, reaches it,
+        // and the next one, at 41, exceeds it.
         {"9 1 20 0.5 1 0.1 1 0.8 10 0.5 1 0.2 1 0.81 28 0.5 29 1", 204, 84000},
         {"30 1 30 0.5", 120, 0},  // no rising edge
         {"60 0", 120, 0},
-        // 9 are skipped and 4 are too few; one point more is enough, its only edge, at 11, is not
-        // scored.
+        // 9 points are skipped and 4 are too few. One point more is enough; its only edge, at 11,
+        // is not scored.
         {"11 0.25 2 1", 100, 0},
         {"12 0.25 2 1", 100, 24000},
     };
     for (const auto &c : cases) EXPECT_EQ(search(c.curve, c.duration_s), c.ms) << c.curve;
 }
 
-// The ten largest edges count: with nine bursts before a passage the passage wins, with ten the
-// first burst. Of thirty passages the last and loudest wins.
+// Only the ten largest edges count: with nine bursts before a passage the passage wins, with ten
+// the first burst. Of thirty passages the last one, which is the loudest, wins.
 TEST(Search, ComparesTenEdgesAndThirtyPassages) {
     std::string bursts = "12 0.25", passages;
     for (int k = 0; k < 9; ++k) bursts += " 1 0." + std::to_string(99 - k) + " 4 0.25";
@@ -222,16 +227,16 @@ TEST(Search, ComparesTenEdgesAndThirtyPassages) {
     EXPECT_EQ(search(passages + "4 0.25 6 1 30 0.25", 660), 2000u * 293u);
 }
 
-TEST(Search, ARequestedLengthMovesTheStart) {
-    // Segments (9, 13) and (29, 49), no valleys; the edge at 29 is chosen and the region ends at
-    // 49, 20 points on.
+TEST(Search, RequestedLengthMovesTheStart) {
+    // Segments (9, 13) and (29, 49), no valleys. The edge at 29 is chosen, and the region ends at
+    // 49, 20 points later.
     const char *plain = "10 0.25 4 0.75 16 0.25 20 1 10 0.25";
     // A region that would exceed the song starts at the first segment or the first valley,
-    // whichever is earlier, or the only one. The dips to 0.1 are valleys.
+    // whichever is earlier. The dips to 0.1 are valleys.
     const char *valley_first = "20 0.5 1 0.1 9 0.5 20 1 5 0.5 1 0.1 4 0.5";
     const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
     const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
-    // One loud point is no segment, and two, (19, 21), are one. The region ends at 27.
+    // One loud point is not a segment; two are one, (19, 21). The region ends at 27.
     const char *one = "20 0.5 1 1 39 0.5", *two = "20 0.5 2 1 38 0.5";
     const struct {
         const char *curve;
@@ -240,11 +245,11 @@ TEST(Search, ARequestedLengthMovesTheStart) {
     } cases[] = {
         {plain, 0, 58000},
         {plain, -30, 58000},
-        {plain, 44, 58000},           // 22 points reach back 2: not worth moving
-        {plain, 46, 58000},           // ideal 26: 29 is the nearest boundary
-        {plain, 60, 26000},           // ideal 19: 13 is
+        {plain, 44, 58000},           // 22 points need a lead of 2, too short to move the start
+        {plain, 46, 58000},           // ideal start 26: 29 is the nearest boundary
+        {plain, 60, 26000},           // ideal start 19: 13 is the nearest boundary
         {plain, 102, 18000},          // 9 + 51 reaches the end: the first segment
-        {plain, 104, 18000},          // and 9 + 52 passes it
+        {plain, 104, 18000},          // 9 + 52 exceeds it: the first segment
         {valley_first, 80, 40000},    // 20 + 40; the segment is at 29
         {segment_first, 102, 18000},  // 9 + 51; the valley is at 39
         {valley_only, 58, 62000},     // 31 + 29
@@ -273,7 +278,7 @@ TEST(Region, EndsAtAValleyOrAFall) {
         {"34 is 3 off: the ideal start itself", loud, 40, 13, {34, 50}, {}, 37},
         {"25 points on", loud, 40, 30, {65}, {}, 35},
         {"26 are too far, and no end is found", loud, 40, 30, {66}, {}, 10},
-        // Ideal start 35.
+        // The ideal start is 35.
         {"the valley before", loud, 40, 15, {37, 50}, {}, 37},
         {"3 off", loud, 40, 15, {38, 50}, {}, 35},
         {"at chosen itself: none before", loud, 40, 15, {34, 40, 50}, {}, 35},
@@ -286,7 +291,7 @@ TEST(Region, EndsAtAValleyOrAFall) {
         {"another follows", loud, 40, 15, {50}, {20, 33, 60, 70}, 33},
         {"60 is farther", loud, 40, 15, {50}, {20, 60}, 20},
         {"0 is no boundary", loud, 40, 15, {50}, {0, 90}, 35},
-        // Without a valley the end is sought from 14 s to 48 s after chosen: points 47 to 64.
+        // Without a valley the end is searched from 14 s to 48 s after chosen: points 47 to 64.
         {"a fall of one deviation ends it at 50", falls, 40, 15, {}, {}, 35},
         {"reached at 50 exactly", falls, 40, 15, {}, {}, 35, 0.625f},
         {"the deepest of the falls, 55", falls, 40, 20, {}, {}, 35, 0.875f},
@@ -310,9 +315,9 @@ TEST(Region, EndsAtAValleyOrAFall) {
         {"before it", loud, -1, 15, {50}, {}, 0},
     };
     for (const auto &c : cases) {
-        std::vector<float> norm = runs(c.curve);
+        std::vector<float> norm = expand(c.curve);
         const auto n = static_cast<int32_t>(norm.size());
-        norm.resize(norm.size() + 3);  // low values after the song, which must not count
+        norm.resize(norm.size() + 3);  // low values after the song, which must be ignored
         indexes found = c.valleys;
         found.resize(15);
         const auto nv = static_cast<int32_t>(c.valleys.size());
@@ -328,48 +333,49 @@ TEST(Tune, StartNearTheEndsOfTheSongIsReturnedUnchanged) {
     for (const uint32_t start : {0u, 2000u, 51001u, 52000u, 70000u}) {
         EXPECT_EQ(_tune_HL_simple(nullptr, kRate, start, 60), start);
     }
-    for (const int32_t rate : {-8000, 0, 2}) {  // 2: a hop of no sample
+    for (const int32_t rate : {-8000, 0, 2}) {  // 2: the hop has no sample
         EXPECT_EQ(_tune_HL_simple(nullptr, rate, 20000, 60), 20000u) << rate;
     }
 }
 
-// Frame k covers steps k to k + 2. A step to square c at step s: the rise at frame s - 3 is on
-// average (c/3 + 2c/3 + 3c) / 5 = 0.8 c, about 3.47 c dB, and counts above 0.13; after it the first
-// of the two equal steps of 0 is taken.
+// Window k covers the steps k to k + 2. A step to the mean square c at step s is a rise at window s
+// - 3: on average (c/3 + 2c/3 + 3c) / 5 = 0.8 c, about 3.47 c dB. It must exceed 0.13. The start
+// moves to the first of the two equal steps of 0 after it.
 TEST(Tune, MovesToTheSharpestRise) {
-    // Mean squares from frame 10 on: 0, 0.2, 0.3, 0.3, 0.2, 0.3, 0.3, 0.2, 0, so the largest rise
-    // is at 10, and the only fall of its five steps leads from 13 to 14.
+    // Mean squares from window 10 on: 0, 0.2, 0.3, 0.3, 0.2, 0.3, 0.3, 0.2, 0. The largest rise is
+    // at 10, and the only fall in its five steps is from 13 to 14.
     const char *song = "13 0 1 .6 1 .3 1 0 1 .3 1 .6 12 0";
     for (const int32_t rate : {8000, 11025, 22051, 44100})
-        EXPECT_EQ(tuned(song, rate, 20000), 22200u) << rate;
-    EXPECT_EQ(tuned(song, kRate, 3000, 12), 5200u);  // 9 s left exactly
-    EXPECT_EQ(tuned(song, kRate, 3000, 11), 3000u);
-    EXPECT_EQ(tuned("13 0 17 .0382"), 5200u);  // a rise of 0.1305
-    EXPECT_EQ(tuned("13 0 17 .0378"), 3000u);  // of 0.1292
-    EXPECT_EQ(tuned("30 .5"), 3000u);
-    EXPECT_EQ(tuned("13 0 5 .039 12 0"), 5200u);  // takes all five frames to count
-    EXPECT_EQ(tuned("3 0 27 .5"), 1200u);         // from the first frame
-    EXPECT_EQ(tuned("24 0 6 .5"), 9600u);         // from the last but five
-    // The first of equal rises, at frame 3, after which 6 to 7 is level.
-    EXPECT_EQ(tuned("6 0 5 .5 7 0 5 .5 7 0"), 2400u);
+        EXPECT_EQ(tune(song, rate, 20000), 22200u) << rate;
+    EXPECT_EQ(tune(song, kRate, 3000, 12), 5200u);  // exactly 9 s left
+    EXPECT_EQ(tune(song, kRate, 3000, 11), 3000u);
+    EXPECT_EQ(tune("13 0 17 .0382"), 5200u);  // a rise of 0.1305
+    EXPECT_EQ(tune("13 0 17 .0378"), 3000u);  // a rise of 0.1292
+    EXPECT_EQ(tune("30 .5"), 3000u);
+    EXPECT_EQ(tune("13 0 5 .039 12 0"), 5200u);  // all five windows must count
+    EXPECT_EQ(tune("3 0 27 .5"), 1200u);         // from the first window
+    EXPECT_EQ(tune("24 0 6 .5"), 9600u);         // from the sixth-to-last window
+    // The first of equal rises, at window 3; the step from 6 to 7 is level.
+    EXPECT_EQ(tune("6 0 5 .5 7 0 5 .5 7 0"), 2400u);
 }
 
-// 120 s, loud from 60 s to 100 s. The window at 54 s is the last without the loud part: coarse
-// start 54 s. Of the 27 frames from 51 s on, frame 22 is half, 23 wholly at the loud level from
-// 60.2 s on; the rise is largest at 19, its smallest step leads from 23 to 24: 51 s + 9.2 s.
-TEST(Position, IsTheTunedStart) {
-    EXPECT_EQ(position(levels("60 .04 40 .64 20 .04", kRate), 120, 58), 60200u);
-    EXPECT_EQ(position({}, 120, 0), 0u);
-    EXPECT_EQ(position(levels("47999 .5", 1), 5, 0), 0u);
-    EXPECT_EQ(position(std::vector<int16_t>(120 * kRate), 120, 58), 0u);
+// 120 s, loud from 60 s to 100 s. The window at 54 s is the last without the loud part, so the
+// coarse start is 54 s. Of the 27 windows from 51 s on, window 22 is half loud, and window 23, at
+// 60.2 s, is completely loud. The largest rise is at 19, its smallest step from 23 to 24: 51 s +
+// 9.2 s.
+TEST(Position, ReturnsTheTunedStart) {
+    EXPECT_EQ(find_position(make_pcm("60 .04 40 .64 20 .04", kRate), 120, 58), 60200u);
+    EXPECT_EQ(find_position({}, 120, 0), 0u);
+    EXPECT_EQ(find_position(make_pcm("47999 .5", 1), 5, 0), 0u);
+    EXPECT_EQ(find_position(std::vector<int16_t>(120 * kRate), 120, 58), 0u);
     clearHighlgihtCtx(nullptr);
 }
 
-// The only edge leads to the window at 112 s, the last but one of 120 s, whose tuning would need
-// audio up to 120.6 s, which the duration states but the PCM does not have. With that audio decoded
-// the same start is tuned: of the frames from 109 s on, the rise is largest at 14, and 18 to 19 is
-// the level step after it: 109 s + 7.2 s.
-TEST(Position, TheTuningNeverReadsPastThePcm) {
-    EXPECT_EQ(position(levels("116 .04 2 .64 2 .04", kRate), 200, 58), 112000u);
-    EXPECT_EQ(position(levels("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);
+// The only edge leads to the window at 112 s, the second-to-last of 120 s. Its tuning needs audio
+// up to 120.6 s, which the duration states but the PCM does not have. With that audio the same
+// start is tuned: of the windows from 109 s on, the largest rise is at 14, and the level step after
+// it is from 18 to 19: 109 s + 7.2 s.
+TEST(Position, TuningDoesNotReadPastThePcm) {
+    EXPECT_EQ(find_position(make_pcm("116 .04 2 .64 2 .04", kRate), 200, 58), 112000u);
+    EXPECT_EQ(find_position(make_pcm("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);
 }

@@ -10,7 +10,7 @@ import java.util.concurrent.CountDownLatch;
 import java.util.concurrent.TimeUnit;
 
 /**
- * The bridge in a real virtual machine, which a thread left attached would keep from exiting.
+ * Tests the bridge in a real virtual machine, which cannot exit while a thread is still attached.
  * Arguments: a song with beats, a clip of 2 s, an empty directory.
  */
 public final class BridgeTest {
@@ -35,10 +35,10 @@ public final class BridgeTest {
         }
     }
 
-    /** Keeps the event of one analysis, after a forbidden call; throws an exception. */
+    /** Records the event of one analysis, calls deinit, which is forbidden there, and throws an exception. */
     private static final class Recorder implements TavoListener {
         final CountDownLatch posted = new CountDownLatch(1);
-        volatile String events = "";  // what deinit answered in each
+        volatile String events = "";  // the result of deinit in each
         volatile int highlight;
         volatile int beats;
 
@@ -57,13 +57,13 @@ public final class BridgeTest {
         }
     }
 
-    /** Runs one analysis to its event, or stops it at once. */
+    /** Runs one analysis to its event, or stops it immediately. */
     private static Recorder analyze(String path, int mode, boolean stop) throws Exception {
         Recorder recorder = new Recorder();
         Tavo tavo = new Tavo(recorder);
         check(tavo.init(path, mode), 0, "init of " + path);
         check(tavo.analyze(0, 0, 0), 0, "analyze");
-        if (!stop) check(recorder.posted.await(120, TimeUnit.SECONDS), true, "an event comes");
+        if (!stop) check(recorder.posted.await(120, TimeUnit.SECONDS), true, "an event arrives");
         check(tavo.deinit(), 0, "deinit");
         check(recorder.events, "-1", "one event, with deinit inside");
         return recorder;
@@ -75,7 +75,7 @@ public final class BridgeTest {
         return recorder.highlight;
     }
 
-    /** An emoji is not found by name, but through a descriptor, which is all some hosts have. */
+    /** A name with an emoji cannot be opened, but a descriptor of the file can. */
     private static void oddNamesAndDescriptors(String song, Path directory) throws Exception {
         int expected = highlight(song);
         Path copy = directory.resolve("Lied \u2013 \u00e4\u00f6\u00fc \u97f3\u697d.wav");

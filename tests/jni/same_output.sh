@@ -1,6 +1,6 @@
 #!/bin/sh
-# same_output.sh TAVO SONG JAVA...: the Java command prints the highlight and the beats as the command
-# TAVO does, whose lines of the stream and the tempo no event carries.
+# same_output.sh TAVO SONG JAVA...: checks that the Java command prints the highlight and the beats as the command
+# TAVO does. TAVO's lines of the stream and the tempo are ignored, because no event carries them.
 set -eu
 tavo=$1
 song=$2
@@ -11,7 +11,7 @@ for options in '--mode highlight --length 10' '--mode beats --max-beats 8' '--mo
   printf '%s\n%s\n' "$options" "$native" | grep '[0-9]:[0-9]'
   [ "$native" = "$("$@" $options "$song")" ]
 done
-# A file that cannot be analysed: status 1 and nothing on standard output. Wrong usage: 2.
+# A file that cannot be analysed gives status 1 and no standard output. Wrong usage gives 2.
 # shellcheck disable=SC2086
 for wrong in '1 /nowhere/song.wav' '2 --mode loud song.wav'; do
   status=0

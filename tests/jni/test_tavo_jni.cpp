@@ -7,7 +7,7 @@
 
 namespace {
 
-using fake_vm::now;
+using fake_vm::machine_state;
 using numbers = std::vector<jint>;  // of an event
 
 const std::string kOpened = "2: tavo_init and setcallback is finished\n";
@@ -18,7 +18,7 @@ const std::string kNoHost = "6: Can't find com/kestu/tavo/Tavo\n";
 const std::string kNotNotified = "6: An exception occurred while notifying an event.\n";
 const std::string kNotAttached = "6: Failed to get the environment using AttachCurrentThread()\n";
 
-// Any object is this one; its references are the machine's.
+// The only object; the machine counts its references.
 const auto object = reinterpret_cast<jobject>(&fake_vm::machine);
 
 void setup(jobject obj = object) {
@@ -39,93 +39,94 @@ void call_back_on_a_thread(TAVO_INFO info) {
     std::thread([&info] { tavocallback(&info); }).join();
 }
 
-void expect_held(int global_references) {
+void expect_references(int global_references) {
     EXPECT_EQ(fake_vm::global_references, global_references);
-    EXPECT_EQ(fake_vm::lent, 0);
-    EXPECT_EQ(fake_vm::wrong, 0);
+    EXPECT_EQ(fake_vm::unreturned, 0);
+    EXPECT_EQ(fake_vm::misplaced_calls, 0);
     EXPECT_FALSE(fake_vm::pending);
 }
 
 struct Jni : testing::Test {
     void SetUp() override {
         fnamedec = "";
-        now = {};
+        machine_state = {};
         ASSERT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), JNI_VERSION_1_6);
         setup();
     }
     void TearDown() override {
         EXPECT_EQ(deinit(), 0);
-        expect_held(2);  // the class and the object that setup was given
+        expect_references(2);  // the class and the object passed to setup
     }
 };
 
-// First in this file: nothing of the bridge exists yet.
-TEST(JniFirstCalls, EachIsHarmlessAndMakesWhatItNeeds) {
+// Must be the first test in this file, because nothing of the bridge may exist yet.
+TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     TAVO_INFO info = {};
     tavocallback(&info);  // no virtual machine
-    now.failing = "GetEnv";
+    machine_state.failing = "GetEnv";
     EXPECT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), -1);
     ASSERT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), 0x10006);
 
-    // The callback before init: without a host, without its method, and with both.
+    // The callback before init: without a host class, without its method, and with both.
     call_back_on_a_thread(info);
-    EXPECT_EQ(now.log_lines, kNotAttached + kNotNotified);
-    now = {"GetStaticMethodID"};
+    EXPECT_EQ(machine_state.log_lines, kNotAttached + kNotNotified);
+    machine_state = {"GetStaticMethodID"};
     setup();
     call_back_on_a_thread(info);
-    EXPECT_TRUE(now.events.empty());
+    EXPECT_TRUE(machine_state.events.empty());
     tavocallback(&info);
-    EXPECT_EQ(now.events.size(), 1u);
+    EXPECT_EQ(machine_state.events.size(), 1u);
 
     EXPECT_EQ(numbers({analyze(), deinit()}), numbers({0, 0}));
-    EXPECT_EQ(now.log_lines, kNotNotified + kNoInstance);
+    EXPECT_EQ(machine_state.log_lines, kNotNotified + kNoInstance);
     EXPECT_EQ(tavo_jni_mutex, nullptr);
 
-    // An existing lock is used, not replaced: free while the characters are asked for, held when
-    // they are given back.
-    pthread_mutex_t own = PTHREAD_MUTEX_INITIALIZER;
-    tavo_jni_mutex = &own;
+    // An existing lock is used, not replaced. It is free while the path's characters are requested
+    // and held while they are released.
+    pthread_mutex_t existing_lock = PTHREAD_MUTEX_INITIALIZER;
+    tavo_jni_mutex = &existing_lock;
     std::vector<int> trials;
     const auto try_lock = [&] {
-        trials.push_back(pthread_mutex_trylock(&own));
-        if (trials.back() == 0) pthread_mutex_unlock(&own);
+        trials.push_back(pthread_mutex_trylock(&existing_lock));
+        if (trials.back() == 0) pthread_mutex_unlock(&existing_lock);
     };
-    now = {"", 0, "GetStringUTFChars", try_lock};
+    machine_state = {"", 0, "GetStringUTFChars", try_lock};
     EXPECT_EQ(init("/nowhere.wav"), -4);
-    now.watched = "ReleaseStringUTFChars";
+    machine_state.watched = "ReleaseStringUTFChars";
     EXPECT_EQ(init("/nowhere.wav"), -4);
     EXPECT_EQ(trials, (std::vector<int>{0, EBUSY}));
     tavo_jni_mutex = nullptr;
     EXPECT_EQ(init(nullptr), -4);
     EXPECT_NE(tavo_jni_mutex, nullptr);
-    EXPECT_EQ(now.log_lines, kUnusable + kUnusable + kUnusable);
-    expect_held(2);
+    EXPECT_EQ(machine_state.log_lines, kUnusable + kUnusable + kUnusable);
+    expect_references(2);
 }
 
-// Inside the event, while a deinit elsewhere holds the lock and waits for it, no call waits.
-TEST_F(Jni, AJobIsOpenedStartedAndEndedOnce) {
+// No call inside an event waits for the lock, although a deinit on another thread holds it while it
+// waits for the event.
+TEST_F(Jni, JobIsOpenedStartedAndEndedOnce) {
     numbers inside;
-    now.watched = "CallStaticVoidMethod";
-    now.action = [&inside] {
+    machine_state.watched = "CallStaticVoidMethod";
+    machine_state.action = [&inside] {
         while (pthread_mutex_trylock(tavo_jni_mutex) == 0) pthread_mutex_unlock(tavo_jni_mutex);
         inside = {analyze(), deinit(), init(nullptr)};
     };
     EXPECT_EQ(numbers({init(), init(), init(nullptr), analyze()}), numbers({0, -1, -1, 0}));
     EXPECT_EQ(numbers({deinit(), deinit(), analyze()}), numbers({0, 0, 0}));
     EXPECT_EQ(inside, numbers({-1, -1, -1}));
-    EXPECT_EQ(now.events.size(), 1u);
+    EXPECT_EQ(machine_state.events.size(), 1u);
 
-    const size_t at = now.log_lines.find("(id:") + 4;
-    const std::string id = std::to_string(std::stol(now.log_lines.substr(at)));
-    EXPECT_EQ(now.log_lines, kOpened + kBusyLog + kBusyLog + "2: tavo_analyze (id:" + id +
-                                 ") - start\n6: tavo_analyze() is failed. error=-5\n" +
-                                 "6: tavo_deinit(" + id + ") is failed. error=-4\n" + kBusyLog +
-                                 "2: tavo_deinit(" + id + ") is finished successfully\n" +
-                                 kNoInstance);
+    const size_t at = machine_state.log_lines.find("(id:") + 4;
+    const std::string id = std::to_string(std::stol(machine_state.log_lines.substr(at)));
+    EXPECT_EQ(machine_state.log_lines, kOpened + kBusyLog + kBusyLog + "2: tavo_analyze (id:" + id +
+                                           ") - start\n6: tavo_analyze() is failed. error=-5\n" +
+                                           "6: tavo_deinit(" + id + ") is failed. error=-4\n" +
+                                           kBusyLog + "2: tavo_deinit(" + id +
+                                           ") is finished successfully\n" + kNoInstance);
 }
 
-// A failed setup keeps the earlier host, a failed init leaves no instance, and what fails in an
-// event is known to the log alone.
+// A failed setup keeps the earlier references, a failed init leaves no instance, and a failure
+// inside an event is only logged.
 TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
     std::vector<float> times(120);
     for (size_t i = 0; i < times.size(); ++i) times[i] = 500.0f * static_cast<float>(i) + 0.25f;
@@ -156,49 +157,50 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
     for (const auto &each : cases) {
         SCOPED_TRACE(testing::Message() << each.failing << each.nth << ", " << each.info.hl_pos);
         const bool opens = each.log != kUnusable;
-        now = {each.failing, each.nth};
+        machine_state = {each.failing, each.nth};
         setup();
         EXPECT_EQ(init(), opens ? 0 : -4);
         if (opens) call_back_on_a_thread(each.info);
-        EXPECT_EQ(now.log_lines, each.log);
-        expect_held(2);
+        EXPECT_EQ(machine_state.log_lines, each.log);
+        expect_references(2);
         EXPECT_EQ(deinit(), 0);
-        EXPECT_EQ(now.log_lines == each.log + kNoInstance, !opens);
-        ASSERT_EQ(now.events.size(), each.event.empty() ? 0u : 1u);
-        if (now.events.empty()) continue;
-        EXPECT_NE(now.events[0].object, nullptr);
-        EXPECT_EQ(now.events[0].numbers, each.event);
+        EXPECT_EQ(machine_state.log_lines == each.log + kNoInstance, !opens);
+        ASSERT_EQ(machine_state.events.size(), each.event.empty() ? 0u : 1u);
+        if (machine_state.events.empty()) continue;
+        EXPECT_NE(machine_state.events[0].object, nullptr);
+        EXPECT_EQ(machine_state.events[0].numbers, each.event);
         const std::vector<float> beats(times.begin(), times.begin() + each.event[2]);
-        EXPECT_EQ(now.events[0].beats, beats.empty() ? std::nullopt : std::optional(beats));
+        EXPECT_EQ(machine_state.events[0].beats,
+                  beats.empty() ? std::nullopt : std::optional(beats));
     }
 }
 
-// From a thread that the machine knows, which stays attached. What an event uses lives on until it
-// has returned.
-TEST_F(Jni, ARepeatedSetupReplacesItsReferences) {
+// The callback runs on a thread that the machine knows, which stays attached. References that an
+// event uses stay valid until it has returned.
+TEST_F(Jni, RepeatedSetupReplacesTheReferences) {
     ASSERT_EQ(init(), 0);
     TAVO_INFO info = {};
-    now.watched = "CallStaticVoidMethod";
-    now.action = [] {
+    machine_state.watched = "CallStaticVoidMethod";
+    machine_state.action = [] {
         setup();
         EXPECT_EQ(fake_vm::global_references, 4);
     };
     tavocallback(&info);
-    expect_held(2);
-    now.watched = "";
+    expect_references(2);
+    machine_state.watched = "";
     tavocallback(&info);
     setup(nullptr);  // a null object is passed on as null
-    expect_held(1);
+    expect_references(1);
     tavocallback(&info);
 
-    ASSERT_EQ(now.events.size(), 3u);
-    EXPECT_NE(now.events[0].object, now.events[1].object);
-    EXPECT_NE(now.events[1].object, nullptr);
-    EXPECT_EQ(now.events[2].object, nullptr);
+    ASSERT_EQ(machine_state.events.size(), 3u);
+    EXPECT_NE(machine_state.events[0].object, machine_state.events[1].object);
+    EXPECT_NE(machine_state.events[1].object, nullptr);
+    EXPECT_EQ(machine_state.events[2].object, nullptr);
     setup();
 }
 
-TEST_F(Jni, ThreadsMayComeTogether) {
+TEST_F(Jni, ConcurrentCallsOpenOneInstance) {
     numbers results(4);
     std::vector<std::thread> threads;
     for (jint &result : results) threads.emplace_back([&result] { result = init(); });
@@ -211,7 +213,7 @@ TEST_F(Jni, ThreadsMayComeTogether) {
     });
     for (int i = 0; i < 200; ++i) call_back_on_a_thread({});
     setups.join();
-    EXPECT_EQ(now.events.size(), 200u);
+    EXPECT_EQ(machine_state.events.size(), 200u);
 }
 
 }  // namespace

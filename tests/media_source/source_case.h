@@ -1,5 +1,5 @@
-// Files by their content, one row for each format source, and a fixture that opens and reads them.
-// The fake codec library decides what the decoders deliver.
+// The content of a file for each format source, and a fixture that opens and reads such files. The
+// fake codec library determines what the decoders deliver.
 #ifndef TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 #define TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 
@@ -11,29 +11,30 @@
 
 #include "media_source/mtsrc_ctx.h"
 #include "tests/support/bytes.h"
-#include "tests/support/scripted_codec.h"
+#include "tests/support/fake_codec.h"
 
 using namespace std::string_literals;
 using samples = std::vector<int16_t>;
-using scripted::bytes_of;
+using fake_codec::bytes_of;
 using support::zeros;
 
 inline const std::string kWavFile = "RIFF\0\0\0\0WAVEfmt "s, kMp4File = "\0\0\0\0ftyp"s + zeros(8);
-// Two Layer III frame headers at 128 kbit/s and 44,100 Hz, one frame length of 417 bytes apart.
+// Two Layer III frame headers at 128 kbit/s and 44,100 Hz, one frame length (417 bytes) apart.
 inline const std::string kLayer3Pair = "\xFF\xFB\x90" + zeros(414) + "\xFF\xFB\x90\0"s;
 
 inline const std::string kAsf = "\x30\x26\xB2\x75\x8E\x66\xCF\x11\xA6\xD9\x00\xAA\x00\x62\xCE\x6C"s;
 
 struct source_row {
     std::string name, file;
-    int32_t tag;  // codec of the script; 0: the format's own
+    int32_t tag;  // codec of the stream; 0: the format's own
     int32_t codec, frame_bytes;
-    int32_t channels;             // of the format; 0: the script's
-    int32_t least, most;          // Hz
-    std::string config;           // of the decoder, for 5 channels at 22,050 Hz
-    std::string reader, decoder;  // what the names of their functions begin with; empty: none
-    std::string opens;            // calls of an open
-    std::string codes;            // of the open when that call fails; 0: its result is unused
+    int32_t channels;             // of the format; 0: same as the stream
+    int32_t min_rate, max_rate;   // accepted sample rates, Hz
+    std::string config;           // the decoder's configuration for 5 channels at 22,050 Hz
+    std::string reader, decoder;  // prefixes of their function names; empty if not used
+    std::string opens;            // calls made by an open
+    std::string
+        codes;  // code of the open if the call at that place fails; 0: the result is ignored
 };
 inline const std::string kAacConfig = bytes_of(xaac_config{{1, 2, 2, 0}, 3, 22050, 5, 0});
 inline const std::string kMpegConfig = bytes_of(wexa_config{1, 0, 2, 0});
@@ -70,46 +71,46 @@ struct SourceTest : testing::Test {
 
     ~SourceTest() override {
         close_source();
-        EXPECT_TRUE(scripted::all.faults.empty()) << scripted::all.faults[0];
-        scripted::all = {};
+        EXPECT_TRUE(fake_codec::state.misuses.empty()) << fake_codec::state.misuses[0];
+        fake_codec::state = {};
     }
     template <typename action>
-    void for_each_row(action act) {
+    void for_each_row(action test) {
         for (const source_row &row : kRows) {
             SCOPED_TRACE(row.name);
-            act(row);
+            test(row);
         }
     }
-    // All three return the code.
-    int32_t open_path(const std::string &where) {
+    // These functions return the code of the open.
+    int32_t open_path(const std::string &path) {
         close_source();
-        scripted::all.calls.clear();
-        const mtsrc_param param = {where.c_str()};
+        fake_codec::state.calls.clear();
+        const mtsrc_param param = {path.c_str()};
         src = mtsrc_init(&param, &err);
         EXPECT_EQ(src != nullptr, err == 0);
-        EXPECT_TRUE(scripted::tags_are_empty() && (src || scripted::all.alive.empty()));
+        EXPECT_TRUE(fake_codec::tags_are_empty() && (src || fake_codec::state.objects.empty()));
         return err;
     }
     int32_t open_bytes(const std::string &content) {
         std::ofstream(file.path) << content;
         return open_path(file.path);
     }
-    int32_t open_row(const source_row &row, scripted::script plan = {}) {
-        if (row.tag != 0 && !plan.codec) plan.codec = row.tag;
-        scripted::all.use(plan);
+    int32_t open_row(const source_row &row, fake_codec::stream_spec stream = {}) {
+        if (row.tag != 0 && !stream.codec) stream.codec = row.tag;
+        fake_codec::state.streams.push_back(stream);
         return open_bytes(row.file);
     }
-    // Opens a file of these frames; its calls are forgotten.
-    void open_frames(const source_row &row, const std::vector<scripted::frame> &frames,
+    // Opens a file with these frames and clears the recorded calls.
+    void open_frames(const source_row &row, const std::vector<fake_codec::frame> &frames,
                      int32_t channels = 2, int32_t rate = 44100) {
-        scripted::script plan = {rate, channels};
-        plan.frames = frames;
-        ASSERT_EQ(open_row(row, plan), 0);
-        scripted::all.calls.clear();
+        fake_codec::stream_spec stream = {rate, channels};
+        stream.frames = frames;
+        ASSERT_EQ(open_row(row, stream), 0);
+        fake_codec::state.calls.clear();
     }
     void close_source() {
         EXPECT_EQ(mtsrc_deinit(src), src ? -5 : -4);
-        EXPECT_TRUE(scripted::all.alive.empty());
+        EXPECT_TRUE(fake_codec::state.objects.empty());
         src = nullptr;
     }
 };

@@ -1,4 +1,4 @@
-// The file callbacks, and the recognition of formats by hand-made heads.
+// The file callbacks, and recognition of hand-made file heads.
 #include <sys/mman.h>
 #include <sys/stat.h>
 
@@ -9,9 +9,9 @@
 namespace {
 
 constexpr size_t kScanBytes = 32768;
-constexpr int64_t kBefore = 5;  // bytes before the content that is recognised
+constexpr int64_t kBefore = 5;  // bytes before the content to be recognised
 
-TEST(FileIo, Callbacks) {
+TEST(FileIo, CallbacksReadWriteAndSeek) {
     std::string path = testing::TempDir() + "tavo_file_io_" + std::to_string(getpid());
     mtsrc_io io = {};
     io.path = path.data();
@@ -23,7 +23,7 @@ TEST(FileIo, Callbacks) {
     EXPECT_EQ(mtsrc_file_write(file, "0123456789", 10), 10);
     EXPECT_EQ(mtsrc_file_close(file), 0);
 
-    file = mtsrc_file_open(&io, 2);  // bit 0 alone decides
+    file = mtsrc_file_open(&io, 2);  // only bit 0 of the mode is used
     unlink(path.c_str());
     char buf[16] = {};
     EXPECT_EQ(mtsrc_file_write(file, "x", 1), -1);
@@ -37,7 +37,7 @@ TEST(FileIo, Callbacks) {
     EXPECT_TRUE(mtsrc_file_tell(file, &value) == 0 && value == 8);
     EXPECT_EQ(mtsrc_file_close(file), 0);
 
-    // One call of the system each: the rest of what is asked of a pipe may never come.
+    // Each call is one system call: a pipe may never deliver the rest of a request.
     int ends[2];
     EXPECT_TRUE(pipe(ends) == 0 && write(ends[1], "123456", 6) == 6);
     mtsrc_file handle = {ends[0]};
@@ -50,15 +50,15 @@ TEST(FileIo, Callbacks) {
     EXPECT_EQ(mtsrc_file_close(new (malloc(sizeof handle)) mtsrc_file{-1}), 0);
 }
 
-// The type of a file positioned at the content, or the code of a failure. The record has the
-// callbacks that probes may use.
+// Returns the type of a file positioned at the content, or the code of a failure. The record has
+// only the callbacks that probes may use.
 int32_t type_of(std::string content, decltype(mtsrc_io::seek) seek = mtsrc_file_seek) {
     mtsrc_io io = {};
     io.read = mtsrc_file_read;
     io.tell = mtsrc_file_tell;
     io.seek = seek;
     io.skip = mtsrc_file_skip;
-    content.resize(std::max<size_t>(content.size(), 16));  // the head that is always read
+    content.resize(std::max<size_t>(content.size(), 16));  // recognition always reads 16 bytes
     content = zeros(kBefore) + content;
     mtsrc_file file = {memfd_create("content", 0)};
     EXPECT_GT(write(file.fd, content.data(), content.size()), kBefore);
@@ -70,31 +70,33 @@ int32_t type_of(std::string content, decltype(mtsrc_io::seek) seek = mtsrc_file_
     return code == 0 ? type : code;
 }
 
-// A tag of version 2.3 with a body of so many zero bytes.
+// An ID3v2.3 tag with a body of zeros.
 std::string id3(int32_t body) {
     std::string tag = "ID3\3\0\0"s;
     for (const int shift : {21, 14, 7, 0}) tag += static_cast<char>(body >> shift & 0x7F);
     return tag + zeros(static_cast<size_t>(body));
 }
 
-std::string put(std::string content, size_t at, const std::string &piece) {
-    content.resize(std::max(content.size(), at + piece.size()));
-    return content.replace(at, piece.size(), piece);
+std::string put(std::string content, size_t at, const std::string &bytes) {
+    content.resize(std::max(content.size(), at + bytes.size()));
+    return content.replace(at, bytes.size(), bytes);
 }
 
 void expect_type(int32_t type, const std::vector<std::string> &contents) {
-    for (const std::string &each : contents) {
-        EXPECT_EQ(type_of(each), type) << &each - contents.data() << ": " << each.substr(0, 16);
+    for (const std::string &content : contents) {
+        EXPECT_EQ(type_of(content), type)
+            << &content - contents.data() << ": " << content.substr(0, 16);
     }
 }
 
-TEST(Recognise, FilesByTheirHeads) {
+TEST(Recognise, FirstBytesDetermineTheType) {
     std::string long_tag = id3((1 << 21) + (3 << 14) + (2 << 7) + 5);
-    for (const size_t at : {6u, 8u}) long_tag[at] |= '\x80';  // its top bits are not looked at
+    for (const size_t at : {6u, 8u})
+        long_tag[at] |= '\x80';  // the top bits of size bytes are ignored
     expect_type(2002, {kAsf});
     expect_type(2000, {"1234ftyp", "1234mdat", "1234moov"});
     expect_type(322, {"fLaC", long_tag + "fLaC"});
-    expect_type(2005, {"OggS\0\6"s, "OggS" + zeros(10) + "\1"});  // flags, any serial number
+    expect_type(2005, {"OggS\0\6"s, "OggS" + zeros(10) + "\1"});  // header flags, any serial number
     expect_type(2006, {kWavFile});
     expect_type(2007, {"ADIF", "\xFF\xF0", "\xFF\xF1", "\xFF\xF8", "\xFF\xF9"});
     expect_type(2007, {id3(130) + "\xFF\xF1" + zeros(5)});
@@ -105,14 +107,14 @@ TEST(Recognise, FilesByTheirHeads) {
     EXPECT_EQ(type_of(kAsf, [](mtsrc_file *, const int64_t *) { return -1; }), -6);
 }
 
-// The header, and the same header so many bytes later, the last of the file.
+// The header, and the same header at a distance, which is the end of the file.
 std::string pair(const std::string &header, size_t distance) {
     return put(header, distance, header + zeros(1));
 }
 
-// As published: kilobits a second of each bitrate index from 1 on, and what a frame of 1 kbit/s
-// takes at 1 kHz, in slots of one byte or, in Layer I, of four. Padding is one slot more.
-TEST(ProbeMpeg, TwoHeadersOneFrameLengthApart) {
+// The standard gives the bitrate in kbit/s for each index from 1 on, and the slots of a frame with
+// 1 kbit/s at 1 kHz. A slot is one byte, in Layer I four. Padding adds one slot.
+TEST(ProbeMpeg, FindsTwoHeadersOneFrameLengthApart) {
     using list = std::vector<size_t>;
     const list kbit1 = {32, 64, 96, 128, 160, 192, 224, 256, 288, 320, 352, 384, 416, 448};
     const list kbit2 = {32, 48, 56, 64, 80, 96, 112, 128, 160, 192, 224, 256, 320, 384};
@@ -120,9 +122,9 @@ TEST(ProbeMpeg, TwoHeadersOneFrameLengthApart) {
     const list low_kbit1 = {32, 48, 56, 64, 80, 96, 112, 128, 144, 160, 176, 192, 224, 256};
     const list low_kbit = {8, 16, 24, 32, 40, 48, 56, 64, 80, 96, 112, 128, 144, 160};
     const struct {
-        char second;  // byte of the header
+        char second;  // second byte of the header
         int32_t type;
-        size_t slots, slot_bytes, divisor;  // of the first version's rates
+        size_t slots, slot_bytes, divisor;  // divisor: of the rates of MPEG-1
         list kilobits;
     } rows[] = {{'\xFF', 303, 12, 4, 1, kbit1},     {'\xFD', 304, 144, 1, 1, kbit2},
                 {'\xFB', 305, 144, 1, 1, kbit3},    {'\xF7', 303, 12, 4, 2, low_kbit1},
@@ -144,44 +146,44 @@ TEST(ProbeMpeg, TwoHeadersOneFrameLengthApart) {
     }
 }
 
-// Free format and Layers II and I of MPEG-2.5, whose lengths do not matter in a follower. No
-// bitrate, no rate, no version, no layer, 10 bits of sync, no sync byte.
+// Free format and Layers I and II of MPEG-2.5, whose length is not needed for the second header.
+// Then invalid bitrate, rate, version, layer, a sync of 10 bits, and no sync byte.
 TEST(ProbeMpeg, InvalidHeadersAreRejected) {
     const std::pair<const char *, int32_t> cases[] = {
         {"\xFF\xFB\x01", 305},  {"\xFF\xE5\x90", 304},  {"\xFF\xE7\x90", 303},
         {"\xFF\xFB\xF0", 2199}, {"\xFF\xFB\x9C", 2199}, {"\xFF\xEB\x90", 2199},
         {"\xFF\xF9\x90", 2199}, {"\xFF\xDB\x90", 2199}, {"\xFE\xFB\x90", 2199}};
-    for (const auto &[header, as_follower] : cases) {
+    for (const auto &[header, as_second] : cases) {
         expect_type(2199, {zeros(1) + put(kLayer3Pair, 0, header)});
-        expect_type(as_follower, {put(kLayer3Pair, 417, header)});
+        expect_type(as_second, {put(kLayer3Pair, 417, header)});
     }
-    // At the lengths that those two layers would have.
+    // The distances that frames of those two layers would have.
     expect_type(2199, {pair("\xFF\xE5\x90", 1044), pair("\xFF\xE7\x90", 624)});
 }
 
 TEST(ProbeMpeg, ScanContinuesAfterARejectedCandidate) {
-    // Two candidates overlap: at 0 a Layer I frame of 488 bytes without a follower, at 1 a Layer
-    // III frame of 52.
+    // Two candidates overlap: at 0 a Layer I frame of 488 bytes without a successor, at 1 a Layer
+    // III frame of 52 bytes.
     const std::string overlap = put("\xFF\xFF\xE2\x10", 53, "\xFF\xE2\x10\0"s) + zeros(600);
     expect_type(305, {"\xFF\xFB\x90" + kLayer3Pair, overlap});
-    // A follower at 32,764 ends the scan: a shorter pair after the candidate is not seen.
+    // A second header at 32,764 ends the scan, so a shorter pair after the candidate is not found.
     const std::string late = put(zeros(kScanBytes), 32500, pair("\xFF\xFF\x10", 32));
     expect_type(305, {put(zeros(kScanBytes), 32763 - 417, kLayer3Pair)});
     expect_type(303, {late});
     expect_type(2199, {put(late, 32764 - 417, "\xFF\xFB\x90")});
-    // The headers within a tag do not count, those in what only looks like one do.
+    // Headers inside a tag are ignored, but not headers inside bytes that only resemble a tag.
     const std::string tag = put(id3(1000), 20, kLayer3Pair), long_tag = zeros(100) + id3(40000);
     const std::string tags = id3(3) + id3(0) + zeros(7) + id3(50);
     expect_type(305,
                 {long_tag + kLayer3Pair, tags + kLayer3Pair, put(tag, 3, "\1"), put(tag, 3, "\5")});
     expect_type(2199, {long_tag, id3(3) + tag + zeros(20), put(tag, 3, "\2"), put(tag, 3, "\4")});
-    for (const size_t inside : {4u, 6u, 9u, 10u}) {  // bytes of a tag that are in the buffer
+    for (const size_t inside : {4u, 6u, 9u, 10u}) {  // number of the tag's bytes in the buffer
         const std::string before = zeros(kScanBytes - inside) + id3(700);
         expect_type(305, {before + kLayer3Pair});
         expect_type(2199, {before, zeros(kScanBytes - inside) + "ID3\3" + zeros(5)});
     }
-    // Ogg, a program stream and none; a transport stream, whose second sync byte stands at 188 of
-    // the file and not of what is recognised.
+    // Ogg, a program stream and a similar start code. A transport stream has its second sync byte
+    // at offset 188 of the file, wherever the content to be recognised starts.
     const std::string sync = "\x47" + kLayer3Pair;
     expect_type(2199, {"OggS" + kLayer3Pair, "\0\0\1\xBA"s + kLayer3Pair});
     expect_type(2199, {put(sync, 188 - kBefore, "\x47"), "\x47"});

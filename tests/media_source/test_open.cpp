@@ -1,4 +1,4 @@
-// Opening and closing, through mtsrc.h and through each format's own operations.
+// Opening and closing, through mtsrc.h and through the operations of each format.
 #include <fcntl.h>
 
 #include <tuple>
@@ -9,10 +9,10 @@ namespace {
 
 using OpenClose = SourceTest;
 
-TEST_F(OpenClose, CallsRecordsAndOrder) {
+TEST_F(OpenClose, OpenCallsTheCodecLibraryInOrder) {
     for_each_row([&](const source_row &row) {
         ASSERT_EQ(open_row(row, {22050, 5, 16, {}, 123'456'789'012}), 0);
-        EXPECT_EQ(scripted::call_names(), row.opens);
+        EXPECT_EQ(fake_codec::call_names(), row.opens);
         EXPECT_TRUE(memcmp(&src->mark, "KOVA", 4) == 0 && src->codec == row.codec);
         EXPECT_EQ(src->frm_buf_size, row.frame_bytes);
         mtsrc_format format;
@@ -20,17 +20,18 @@ TEST_F(OpenClose, CallsRecordsAndOrder) {
         EXPECT_EQ(mtsrc_getstream_format(src, &format), 0);
         EXPECT_TRUE(format.sample_rate == 22050 && format.duration == 123'456'789'012);
         EXPECT_TRUE(format.channels == (row.channels ? row.channels : 5) && format.bits == 16);
-        EXPECT_EQ(bytes_of(format).substr(12, 4), "\xAB\xAB\xAB\xAB");  // the gap is the caller's
-        // Reader: the handle's callbacks, word and information record zeroed. Decoder: last.
-        const std::vector<scripted::call> made = scripted::calls_of("_create");
-        const std::string zeroed = made[0].records[1] + made[0].records[2];
-        EXPECT_TRUE(made[0].addresses[0] == &src->io && zeroed == zeros(zeroed.size()));
-        EXPECT_TRUE(row.decoder.empty() || made.back().records[0] == row.config);
+        EXPECT_EQ(bytes_of(format).substr(12, 4),
+                  "\xAB\xAB\xAB\xAB");  // the padding belongs to the caller
+        // The reader gets the handle's callbacks and zeroed records. The decoder is created last.
+        const std::vector<fake_codec::call> created = fake_codec::calls_of("_create");
+        const std::string zeroed = created[0].records[1] + created[0].records[2];
+        EXPECT_TRUE(created[0].addresses[0] == &src->io && zeroed == zeros(zeroed.size()));
+        EXPECT_TRUE(row.decoder.empty() || created.back().records[0] == row.config);
     });
 }
 
-// A failing open de-initialises the codec library, then mtsrc_open_mfal closes the source again.
-TEST_F(OpenClose, EachFailingStepIsCleanedUp) {
+// A failed open de-initialises the codec library; then mtsrc_open_mfal closes the source again.
+TEST_F(OpenClose, AFailedStepIsCleanedUp) {
     for_each_row([&](const source_row &row) {
         const size_t libraries = row.decoder.empty() ? 0 : row.tag ? 2 : 1;
         std::istringstream steps(row.opens), codes(row.codes);
@@ -38,36 +39,40 @@ TEST_F(OpenClose, EachFailingStepIsCleanedUp) {
         for (int32_t code = 0; steps >> step && codes >> code; before = step) {
             SCOPED_TRACE(done += step + " ");
             if (code == 0) continue;
-            scripted::all.answers[step].assign(step == before ? 1 : 0, 0);
-            scripted::all.answers[step].push_back(-9);
+            fake_codec::state.results[step].assign(step == before ? 1 : 0, 0);
+            fake_codec::state.results[step].push_back(-9);
             EXPECT_EQ(open_row(row), code);
-            EXPECT_EQ(scripted::call_names().substr(0, done.size()), done);
+            EXPECT_EQ(fake_codec::call_names().substr(0, done.size()), done);
             const size_t closes = step.find("_init") == std::string::npos ? 2 : 1;
-            EXPECT_EQ(scripted::calls_of("_deinit").size(), closes * libraries);
+            EXPECT_EQ(fake_codec::calls_of("_deinit").size(), closes * libraries);
         }
     });
 }
 
-TEST_F(OpenClose, RatesAndChannelsAccepted) {
+TEST_F(OpenClose, UnsupportedRatesAndChannelsAreRefused) {
     for_each_row([&](const source_row &row) {
         const bool any = row.channels != 0;
         const std::tuple<int32_t, int32_t, bool> streams[] = {
-            {row.least - 1, 2, row.least == 0}, {row.least, 1, true}, {44100, 0, any},
-            {row.most + 1, 2, false},           {row.most, 2, true},  {44100, -1, any}};
+            {row.min_rate - 1, 2, row.min_rate == 0},
+            {row.min_rate, 1, true},
+            {44100, 0, any},
+            {row.max_rate + 1, 2, false},
+            {row.max_rate, 2, true},
+            {44100, -1, any}};
         for (const auto &[rate, channels, good] : streams) {
             EXPECT_EQ(open_row(row, {rate, channels}), good ? 0 : -3)
                 << rate << " Hz, " << channels << " channels";
         }
     });
-    // Floating point, 8 bits, 24 bits, no reader and an empty record.
+    // Floating point, 8 bits, 24 bits, and no reader with an empty record.
     const int32_t waves[][3] = {{3, 16, 0}, {kWexaPcm, 8, 0}, {kWexaPcm, 24, 0}, {0, 0, -1}};
     for (const auto &[codec, bits, created] : waves) {
-        scripted::all.answers["xwavd_create"] = {created};
+        fake_codec::state.results["xwavd_create"] = {created};
         EXPECT_EQ(open_row(row_of("wav"), {44100, 2, bits, codec}), -3) << codec << ", " << bits;
     }
 }
 
-TEST_F(OpenClose, ContainersChooseTheFirstAudioTrack) {
+TEST_F(OpenClose, FirstAudioTrackIsChosen) {
     EXPECT_EQ(get_mp4_audiostream(nullptr), -1);
     EXPECT_EQ(get_ogg_audiostream(std::make_unique<xogg_info>().get()), -1);
     for (const bool mp4 : {true, false}) {
@@ -77,39 +82,40 @@ TEST_F(OpenClose, ContainersChooseTheFirstAudioTrack) {
         last.back() = 1;
         const struct {
             std::vector<int32_t> kinds;
-            int32_t count;   // that the record tells; beyond its room it does not lead out of it
-            int32_t chosen;  // -1: none
+            int32_t count;   // reported by the record, may exceed its size
+            int32_t chosen;  // index of the track, or -1
         } cases[] = {{{2, 0, 1, 1}, 4, 2},
                      {{2, 1}, 1, -1},
                      {none, 1'000'000'000, -1},
                      {last, 1'000'000'000, mp4 ? 63 : 15}};
         for (const auto &each : cases) {
-            const scripted::script plan = {44100, 2, 16, {}, 0, each.kinds, each.count};
-            EXPECT_EQ(open_row(row, plan), each.chosen < 0 ? -7 : 0) << each.count;
-            EXPECT_TRUE(!src || scripted::calls_of("s_open")[0].number == each.chosen);
+            const fake_codec::stream_spec stream = {44100, 2, 16, {}, 0, each.kinds, each.count};
+            EXPECT_EQ(open_row(row, stream), each.chosen < 0 ? -7 : 0) << each.count;
+            EXPECT_TRUE(!src || fake_codec::calls_of("s_open")[0].number == each.chosen);
         }
         EXPECT_EQ(open_row(row, {44100, 2, 16, 0x54}), mp4 ? -3 : -7);
     }
 }
 
-TEST_F(OpenClose, VorbisSetUpDataReachTheDecoder) {
-    scripted::script plan;
-    plan.setup = std::string(5'000'000, 'x');
-    ASSERT_EQ(open_row(row_of("ogg"), plan), 0);
-    const scripted::call decoded = scripted::calls_of("_decode")[0];
+TEST_F(OpenClose, DecoderReceivesTheVorbisSetUpData) {
+    fake_codec::stream_spec stream;
+    stream.setup = std::string(5'000'000, 'x');
+    ASSERT_EQ(open_row(row_of("ogg"), stream), 0);
+    const fake_codec::call decoded = fake_codec::calls_of("_decode")[0];
     const wexa_frame frame = {nullptr, 0, 5'000'000, 0, 323, 0, {}};
     EXPECT_EQ(decoded.records[0].substr(sizeof frame.data), bytes_of(frame).substr(8));
     EXPECT_EQ(decoded.records[1], zeros(sizeof(wexa_output)));
-    EXPECT_TRUE(decoded.records[3] == plan.setup);
-    plan.setup_length = (1 << 24) + 1;
-    EXPECT_EQ(open_row(row_of("ogg"), plan), -7);
-    plan.setup = std::string(24, 'x');
-    plan.setup_length.reset();
-    ASSERT_EQ(open_row(row_of("ogg"), plan), 0);
-    EXPECT_LE(scripted::calls_of("_get_format").back().number, 40);  // of what was free
+    EXPECT_TRUE(decoded.records[3] == stream.setup);
+    stream.setup_length = (1 << 24) + 1;
+    EXPECT_EQ(open_row(row_of("ogg"), stream), -7);
+    stream.setup = std::string(24, 'x');
+    stream.setup_length.reset();
+    ASSERT_EQ(open_row(row_of("ogg"), stream), 0);
+    EXPECT_LE(fake_codec::calls_of("_get_format").back().number,
+              40);  // bytes; the buffer has the size of the set-up data
 }
 
-TEST_F(OpenClose, WithoutAHandleAProbeFileOrTheMark) {
+TEST_F(OpenClose, BadHandlesAreRefused) {
     using codes = std::vector<int32_t>;
     int64_t reached = 77;
     char byte = 0;
@@ -120,17 +126,17 @@ TEST_F(OpenClose, WithoutAHandleAProbeFileOrTheMark) {
         ASSERT_EQ(open_row(row), 0);
         const mtsrc_ctx format = *src;
         close_source();
-        scripted::all.calls.clear();
+        fake_codec::state.calls.clear();
         format.close(nullptr);
         EXPECT_EQ(codes({format.open(nullptr), format.open(&empty), format.reset(nullptr),
                          format.seek(nullptr, 0, &reached), format.get_frm(nullptr, 0, &frame)}),
                   codes({-4, -7, -4, -4, -4}));
-        EXPECT_EQ(scripted::call_names(), "");
+        EXPECT_EQ(fake_codec::call_names(), "");
     });
     ASSERT_EQ(open_row(row_of("mp4 with aac")), 0);
-    void *const stream = std::exchange(src->dstream, nullptr);
+    void *const dstream = std::exchange(src->dstream, nullptr);
     EXPECT_EQ(mtsrc_seekstream(src, 5, &reached), -4);
-    src->dstream = stream;
+    src->dstream = dstream;
     EXPECT_EQ(mtsrc_getstream_format(src, nullptr), -4);
     memcpy(&empty.mark, "KOVB", 4);
     for (mtsrc_ctx *bad : {static_cast<mtsrc_ctx *>(nullptr), &empty}) {
@@ -141,11 +147,11 @@ TEST_F(OpenClose, WithoutAHandleAProbeFileOrTheMark) {
     EXPECT_TRUE(frame.size == 77 && reached == 77);
 }
 
-TEST_F(OpenClose, PathsAndFiles) {
+TEST_F(OpenClose, UnusablePathsAreRefused) {
     const mtsrc_param no_path = {nullptr};
     EXPECT_TRUE(mtsrc_init(&no_path, &err) == nullptr && err == -4);
     EXPECT_EQ(open_path(file.path), -7);
-    EXPECT_EQ(open_path(testing::TempDir()), -6);  // a directory opens, but cannot be read
+    EXPECT_EQ(open_path(testing::TempDir()), -6);  // a directory can be opened but not read
     EXPECT_EQ(open_bytes(zeros(15)), -6);
     for (const std::string &refused : {zeros(100), kAsf}) EXPECT_EQ(open_bytes(refused), -3);
     for (const std::string &layer : {"\xFF\xFF\x10" + zeros(29) + "\xFF\xFF\x10\0"s,
@@ -157,16 +163,16 @@ TEST_F(OpenClose, PathsAndFiles) {
     EXPECT_EQ(open_path(longest), 0);
     EXPECT_EQ(open_path("/" + longest), -3);
 
-    // A caller's own record: a descriptor, read from its start.
+    // A caller's own callback record with a descriptor is read from its start.
     const int fd = open(path.c_str(), O_RDONLY);
     ASSERT_EQ(lseek(fd, 7, SEEK_SET), 7);
     mtsrc_io io = {};
     mtsrc_file_callbacks(&io);
     io.fd = fd;
     io.path = strdup("fd");
-    scripted::all.answers["xmp123fd_create"] = {-1};
+    fake_codec::state.results["xmp123fd_create"] = {-1};
     EXPECT_TRUE(mtsrc_open_mfal(&io, 0, &err) == nullptr && err == -7);
-    EXPECT_STREQ(io.path, "fd");  // the caller's after a failure
+    EXPECT_STREQ(io.path, "fd");  // after a failure the caller still owns it
     src = mtsrc_open_mfal(&io, 0, &err);
     ASSERT_NE(src, nullptr);
     EXPECT_NE(src->probe_file->fd, fd);

@@ -1,4 +1,4 @@
-"""The man page and the completions know the options that the command has, and no others."""
+"""The man page and the completions have the options of the command, and no others."""
 import os
 import pathlib
 import re
@@ -16,17 +16,17 @@ def run(*command):
 
 
 def complete(*words, folder="/"):
-    """What bash offers for the last of the words."""
+    """Returns what bash offers for the last word."""
     script = ('source "$1"; cd "$2"; shift 2; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); _tavo; '
               'for word in "${COMPREPLY[@]}"; do echo "$word"; done')
-    said = run("bash", "--norc", "-c", script, "bash", BASH, folder, "tavo", *words)
-    assert said.stderr == "", said.stderr
-    return sorted(said.stdout.splitlines())
+    output = run("bash", "--norc", "-c", script, "bash", BASH, folder, "tavo", *words)
+    assert output.stderr == "", output.stderr
+    return sorted(output.stdout.splitlines())
 
 
 def complete_in_fish(word):
-    said = run("fish", "--no-config", "-c", f"source '{FISH}'; complete -C 'tavo {word}'").stdout
-    return sorted(line.split("\t")[0] for line in said.splitlines())
+    output = run("fish", "--no-config", "-c", f"source '{FISH}'; complete -C 'tavo {word}'").stdout
+    return sorted(line.split("\t")[0] for line in output.splitlines())
 
 
 class Papers(unittest.TestCase):
@@ -43,14 +43,14 @@ class Papers(unittest.TestCase):
         self.assertEqual(set(OPTION.findall(re.sub(r"_arguments.*|\[.*?\]", "", ZSH.read_text()))), expected)
 
     def test_short_help(self):
-        """One screen that names every option."""
+        """-h fits one screen and names every option."""
         lines = run(TAVO, "-h").stdout.splitlines()
         self.assertLessEqual((len(lines), max(map(len, lines))), (24, 80))
         named = set(OPTION.findall("\n".join(line for line in lines[lines.index("Examples:") + 6:])))
         self.assertEqual(named, set(complete("-")))
 
     def test_choices(self):
-        """What is completed for an option's value is what the option takes."""
+        """The completions of an option's value are the values that the option accepts."""
         for option in ("--mode", "--format", "--fps"):
             refused = subprocess.run([TAVO, option, "?", "x"], capture_output=True, text=True)
             choices = sorted(re.search(r"{(.*)}", refused.stderr)[1].split(","))

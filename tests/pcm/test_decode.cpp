@@ -2,12 +2,12 @@
 
 namespace {
 
-constexpr int64_t kTenSeconds = 100'000'000;  // units
-constexpr int32_t kRate = 8000;               // the skip is 16,000 bytes
+constexpr int64_t kTenSeconds = 100'000'000;  // 100-ns units
+constexpr int32_t kRate = 8000;               // one second is 16,000 bytes
 
 using DecodePlan = song_plan;
 
-TEST_F(DecodePlan, RefusesShortStreamsAndCutsTheOthers) {
+TEST_F(DecodePlan, RefusesShortStreamsAndSegmentsTheOthers) {
     constexpr int64_t kSetup = INT64_MAX;  // no second plan
     const struct {
         int64_t duration, start;
@@ -20,25 +20,27 @@ TEST_F(DecodePlan, RefusesShortStreamsAndCutsTheOthers) {
         {50'000'000, kSetup, 8000, 0, 1, 80'000},
         {50'000'001, kSetup, 8000, 0, 4, 80'000},
         {-50'000'000, kSetup, 8000, -3, 0, 0},
-        {INT64_MAX / 16'000 + 1, kSetup, 8000, -3, 0, 0},  // the first product to overflow
+        {INT64_MAX / 16'000 + 1, kSetup, 8000, -3, 0,
+         0},  // the smallest duration whose product overflows
         {200'000'000, 100'000'000, 8000, 0, 4, 160'000},
-        {200'000'000, 149'999'999, 8000, 0, 4, 80'000},  // 5 s and a unit
+        {200'000'000, 149'999'999, 8000, 0, 4, 80'000},  // 5 s and one unit left
         {200'000'000, 150'000'000, 8000, 0, 1, 80'000},
-        {50'000'000, -10'000'000, 8000, 0, 1, 96'000},     // as many segments as records
+        {50'000'000, -10'000'000, 8000, 0, 1, 96'000},     // no more segments than records
         {200'000'000, 200'000'000, 8000, -2, 1, 0},        // nothing left
-        {200'000'000, 199'999'999, 8000, -2, 1, 0},        // no whole byte
-        {200'000'000, 200'000'001, 8000, -2, 0, 320'000},  // refused at once
+        {200'000'000, 199'999'999, 8000, -2, 1, 0},        // less than one byte left
+        {200'000'000, 200'000'001, 8000, -2, 0, 320'000},  // refused immediately
         {200'000'000, INT64_MIN, 8000, -2, 0, 320'000},
     };
     head = "RIFF....WAVEfmt ";
-    script.seeks = {{1, {}}};  // no position: the one asked for counts
+    spec.seeks = {{1, {}}};  // no position is reported, so the requested one counts
     for (const auto &each : cases) {
         SCOPED_TRACE(testing::Message() << each.duration << ' ' << each.start << ' ' << each.rate);
         int32_t code = plan(each.duration, each.rate);
         const int32_t records = ctx.seg_count;
         const bool again = each.start != kSetup;
         const int64_t start = again ? each.start : 0;
-        EXPECT_EQ(scripted::all.alive.size(), static_cast<size_t>(records));  // the probe is closed
+        EXPECT_EQ(fake_codec::state.objects.size(),
+                  static_cast<size_t>(records));  // the probe is closed
         if (again) {
             for (int32_t i = 0; i < records; ++i) free(ctx.seg[i].buf);
             free(ctx.pcm);
@@ -56,14 +58,16 @@ TEST_F(DecodePlan, RefusesShortStreamsAndCutsTheOthers) {
             EXPECT_EQ(sources[i].seeks.size(), again && planned ? 1U : 0U);
             EXPECT_EQ(seg.buf != nullptr, code == 0 && planned);
             if (!planned) continue;
-            EXPECT_EQ(seg.cap, each.pcm_bytes / each.segments + (last ? 0 : 4 * each.rate));  // 2 s
+            EXPECT_EQ(seg.cap, each.pcm_bytes / each.segments +
+                                   (last ? 0 : 4 * each.rate));  // 2 s of overlap
             EXPECT_EQ(seg.start, start + i * ((each.duration - start) / each.segments));
             EXPECT_EQ(again ? sources[i].seeks[0] : seg.seek_pos, seg.start);
             EXPECT_TRUE(seg.index == i && seg.count == each.segments && ctx.seg_count == seg.count);
             EXPECT_TRUE(seg.duration == each.duration && seg.fmt.sample_rate == each.rate);
         }
     }
-    // In a table of one record of a longer stream, no record after it is touched, and got stays.
+    // In a table of one record, a plan for a longer stream uses no other record and leaves got
+    // unchanged.
     ASSERT_EQ(plan(50'000'000, kRate), 0);
     free(ctx.pcm);
     free(ctx.seg[0].buf);
@@ -72,34 +76,34 @@ TEST_F(DecodePlan, RefusesShortStreamsAndCutsTheOthers) {
     EXPECT_EQ(construct_decbuf(&ctx, 160'000'000), 0);
     EXPECT_TRUE(ctx.seg_count == 1 && ctx.seg[0].cap == 64'000 && ctx.seg[0].got == 7);
     ctx.duration = 50'000'000;
-    script.seeks = {{0, 1234}};
+    spec.seeks = {{0, 1234}};
     EXPECT_EQ(plan(kTenSeconds, kRate), 0);
     for (int32_t i = 0; i < 4; ++i) EXPECT_EQ(ctx.seg[i].seek_pos, 1234);
 }
 
-TEST_F(DecodePlan, ClosesEverySourceThatWasOpened) {
+TEST_F(DecodePlan, ClosesEverySource) {
     for (size_t good = 0; good <= 4; ++good) {
-        std::deque<int32_t> &answers = scripted::all.answers["xflac_init"];
-        answers.assign(good, 0);
-        answers.push_back(1);
-        // A failing probe is -4 whatever its code; a failing segment keeps its code.
+        std::deque<int32_t> &results = fake_codec::state.results["xflac_init"];
+        results.assign(good, 0);
+        results.push_back(1);
+        // A failed probe gives -4 whatever its code; a failed segment gives its own code.
         EXPECT_EQ(plan(kTenSeconds, kRate), good == 0 ? -4 : -255) << good;
-        EXPECT_TRUE(ctx.seg == nullptr && scripted::all.alive.empty());
+        EXPECT_TRUE(ctx.seg == nullptr && fake_codec::state.objects.empty());
     }
     for (const bool by_duration : {true, false}) {
         ASSERT_EQ(plan(kTenSeconds, kRate), 0);
-        if (by_duration) ctx.seg_count = 1;  // a later plan of one segment
+        if (by_duration) ctx.seg_count = 1;  // a later plan with one segment
         if (!by_duration) ctx.duration = 0;
-        tavo_decode_deinit(&ctx);  // and once more at the next plan
-        EXPECT_TRUE(scripted::all.alive.empty());
+        tavo_decode_deinit(&ctx);  // called again by the next plan
+        EXPECT_TRUE(fake_codec::state.objects.empty());
     }
 }
 
 // Ten seconds at 8000 Hz in four segments of 2.5 s.
 class Decode : public song_plan {
  protected:
-    // Plans the decoding of a stream that ends after so many bytes.
-    void lay(int64_t end = 160'000) {
+    // Plans the decoding of the first end bytes of the stream.
+    void plan_stream(int64_t end = 160'000) {
         ASSERT_EQ(plan(kTenSeconds, kRate, slice(stream, 0, end)), 0);
     }
     int64_t decode() { return DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes); }
@@ -107,17 +111,17 @@ class Decode : public song_plan {
     std::string stream = noise(160'000, 1);
 };
 
-// The last segment starts at byte 120,000 and needs more than its skip.
-TEST_F(Decode, OverlapsAreSplicedWithoutATrace) {
+// The last segment starts at byte 120,000 and needs more than the second that it drops.
+TEST_F(Decode, OutputEqualsTheStream) {
     for (const int64_t end : {160'000, 159'999, 136'200, 136'000, 120'000, 100'000}) {
         const int64_t want = end > 136'000 ? end : 0;
-        lay(end);
+        plan_stream(end);
         EXPECT_EQ(decode(), want);
         EXPECT_EQ(pcm(want), slice(stream, 0, want));
-        EXPECT_EQ(sources[0].most_wanted, 8192);
+        EXPECT_EQ(sources[0].max_request, 8192);
         EXPECT_EQ(ctx.seg[0].got, ctx.seg[0].cap);
     }
-    lay();
+    plan_stream();
     EXPECT_EQ(DecodePcmMT(&ctx, ctx.pcm, 0), 0);
     EXPECT_EQ(DecodePcmMT(&ctx, nullptr, 160'000), 0);
     TAVO_CTX bare = {};
@@ -126,9 +130,9 @@ TEST_F(Decode, OverlapsAreSplicedWithoutATrace) {
     EXPECT_EQ(decode(), 0);
 }
 
-TEST_F(Decode, FailuresEndASegmentAndEmptyReadsDoNot) {
+TEST_F(Decode, FailuresEndASegmentEmptyReadsDoNot) {
     const auto bytes = [&](int32_t code, int replies) {
-        lay();
+        plan_stream();
         for (auto &source : sources) source.code = code;
         for (auto &source : sources) source.empty_replies = replies;
         return decode();
@@ -137,8 +141,8 @@ TEST_F(Decode, FailuresEndASegmentAndEmptyReadsDoNot) {
     for (const int32_t code : {-7, -3, -1, 2, 255}) EXPECT_EQ(bytes(code, 1), 160'000) << code;
     EXPECT_EQ(bytes(0, 65'535), 160'000);
     EXPECT_EQ(bytes(0, 65'536), 0);
-    lay();
-    sources[0].fail_at = 64'000;  // seven whole requests fit, the eighth ends beyond
+    plan_stream();
+    sources[0].fail_at = 64'000;  // seven reads fit, the eighth exceeds it
     EXPECT_EQ(decode(), 160'000);
     EXPECT_EQ(ctx.seg[0].got, 57'344);
 }
@@ -170,7 +174,7 @@ TEST_F(Decode, SpliceIsAtTheLastMatch) {
     };
     for (const auto &each : cases) {
         SCOPED_TRACE(each.name);
-        lay();
+        plan_stream();
         ctx.seg_count = 2;
         for (int i = 0; i < 2; ++i) ctx.seg[i].count = 2;
         sources[0] = {each.first};

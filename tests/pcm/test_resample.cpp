@@ -11,67 +11,69 @@ namespace {
 
 using state_ptr = std::unique_ptr<dorn_resampler_state>;
 
-state_ptr prepared(int32_t source, int32_t target = kAnalysisRate, int32_t code = 0) {
+state_ptr prepare(int32_t source, int32_t target = kAnalysisRate, int32_t code = 0) {
     auto state = std::make_unique<dorn_resampler_state>();
     EXPECT_EQ(dorn_resampler_prepare(state.get(), source, target, 1), code);
     return state;
 }
 
 // Outputs first to n - 1 of a block average. The input is silent before sample base.
-signal_run averaged(int32_t source, int32_t target, int64_t first, int64_t n, const sample_run &in,
-                    int64_t base = 0) {
+signal_run average(int32_t source, int32_t target, int64_t first, int64_t n, const sample_run &in,
+                   int64_t base = 0) {
     const int64_t count = base + int64_t(in.size());
-    // Only the pages in use are ever touched.
-    auto *all = static_cast<int16_t *>(calloc(size_t(count) + 1, sizeof(int16_t)));
-    std::copy(in.begin(), in.end(), all + base);
+    // calloc of a large block: only the pages in use take memory.
+    auto *input = static_cast<int16_t *>(calloc(size_t(count) + 1, sizeof(int16_t)));
+    std::copy(in.begin(), in.end(), input + base);
     signal_run out(size_t(n) + 1, -1.0);
-    resamplePcmMonoMT(all, count, source, out.data(), n, target);
-    EXPECT_TRUE(ext_mutex_resample == nullptr && out.back() == -1.0);  // the lock is the call's own
-    free(all);
+    resamplePcmMonoMT(input, count, source, out.data(), n, target);
+    EXPECT_TRUE(ext_mutex_resample == nullptr &&
+                out.back() == -1.0);  // the call creates its own lock
+    free(input);
     return slice(out, first, n);
 }
 
-TEST(ResampleBlock, MeansOfBlocks) {
-    // 32766.666015625: the spacing is 1/512 here.
-    EXPECT_EQ(averaged(33075, 11025, 0, 2, {1, 0, 0, 32767, 32767, 32766}),
+TEST(ResampleBlock, AveragesBlocks) {
+    // The spacing of floats near 32766.666015625 is 1/512.
+    EXPECT_EQ(average(33075, 11025, 0, 2, {1, 0, 0, 32767, 32767, 32766}),
               (signal_run{0.3333333432674407958984375, 32766.666015625}));
     const sample_run in = {10, 20, 30, 40, 50};
-    // [4, 6) is cut to the last sample; [6, 8) is past the end and takes it too.
-    EXPECT_EQ(averaged(2, 1, 0, 4, in), (signal_run{15, 35, 50, 50}));
-    // Blocks [0, 0) [0, 1) [1, 1) [1, 2) [2, 2): an empty one is the sample that it names.
-    EXPECT_EQ(averaged(1, 2, 0, 5, in), (signal_run{10, 10, 20, 20, 30}));
-    EXPECT_EQ(averaged(1, 1, 0, 1, {}), signal_run{-1});
-    // Beyond 2^24, floats are even and ties go to the multiple of 4.
+    // Block [4, 6) is cut to the last sample. Block [6, 8) is past the end and uses it too.
+    EXPECT_EQ(average(2, 1, 0, 4, in), (signal_run{15, 35, 50, 50}));
+    // Blocks [0, 0) [0, 1) [1, 1) [1, 2) [2, 2). An empty block uses the sample at its start.
+    EXPECT_EQ(average(1, 2, 0, 5, in), (signal_run{10, 10, 20, 20, 30}));
+    EXPECT_EQ(average(1, 1, 0, 1, {}), signal_run{-1});
+    // Above 2^24 floats are even, and ties round to the multiple of 4.
     constexpr int64_t kEven = 16'777'216;
     const sample_run ramp = {2, 1, 2, 3, 4, 5, 6, 7};
-    // Places + 0, 0, 2, 4, 4: [0, 0) empty, [0, 2), [2, 4), [4, 4) empty.
-    EXPECT_EQ(averaged(1, 1, kEven, kEven + 4, ramp, kEven), (signal_run{2, 1.5, 2.5, 4}));
-    // Places 2^24 - 1, + 2, + 4 (of + 5), + 8: one of 3 samples, one of 2, one of 4.
-    EXPECT_EQ(averaged(3, 1, kEven / 3, kEven / 3 + 3, ramp, kEven - 1),
+    // Positions relative to base: 0, 0, 2, 4, 4. Blocks [0, 0) empty, [0, 2), [2, 4), [4, 4) empty.
+    EXPECT_EQ(average(1, 1, kEven, kEven + 4, ramp, kEven), (signal_run{2, 1.5, 2.5, 4}));
+    // Positions relative to base: -1, 2, 4 (rounded from 5), 8. Blocks of 3, 2 and 4 samples.
+    EXPECT_EQ(average(3, 1, kEven / 3, kEven / 3 + 3, ramp, kEven - 1),
               (signal_run{1.66666662693023681640625, 3.5, 6}));
 }
 
-// Expected values were computed independently from the formula of the windowed sinc, in the same
-// precisions; the sine may differ in its last bit. The centre is the cut-off over pi: 0.9 / 8.
-TEST(ResampleSinc, FilterTable) {
+// The expected values were computed independently from the formula of the windowed sinc, in the
+// same precisions; the sine may differ in its last bit. The centre coefficient is the cut-off over
+// pi: 0.9 / 8.
+TEST(ResampleSinc, TableHoldsTheWindowedSinc) {
     for (const auto &[rate, phase, tap, want] : {std::tuple{48000, 0, 9, 0.20671874284744263},
                                                  {48000, 240, 0, -5.7826164265861735e-6},
                                                  {8000, 480, 4, -0.012936153449118137},
                                                  {8000, 700, 19, -9.440486792300362e-6},
                                                  {88200, 123, 14, 0.03232921287417412},
                                                  {88200, 480, 10, 0.1125}}) {
-        EXPECT_NEAR(prepared(rate)->coef[phase][tap], want, std::fabs(want) * 1.3e-7);
+        EXPECT_NEAR(prepare(rate)->coef[phase][tap], want, std::fabs(want) * 1.3e-7);
     }
-    EXPECT_EQ(prepared(48000)->ratio, 48000.0f / 11025.0f);
-    EXPECT_EQ(prepared(7, 1)->ratio, 7.0f);
-    // 88,201 / 11,025 is 0.00009 off a whole ratio, 88,202 is 0.00018.
+    EXPECT_EQ(prepare(48000)->ratio, 48000.0f / 11025.0f);
+    EXPECT_EQ(prepare(7, 1)->ratio, 7.0f);
+    // 88,201 / 11,025 differs from a whole ratio by 0.00009, 88,202 / 11,025 by 0.00018.
     for (const auto &[rate, taps] : {std::pair{88201, 20}, {88202, 19}, {-48000, 19}})
-        EXPECT_EQ(prepared(rate)->taps, taps) << rate;
+        EXPECT_EQ(prepare(rate)->taps, taps) << rate;
     for (const auto &[source, target] : {std::pair{2, 0}, {48000, -1}, {0, kAnalysisRate}})
-        EXPECT_EQ(prepared(source, target, -1)->taps, 0) << source;
+        EXPECT_EQ(prepare(source, target, -1)->taps, 0) << source;
 }
 
-// A filter of 2 taps with coefficients a, b, c in the middle phase.
+// A filter of 2 taps with the coefficients a, b, c in the middle phase.
 state_ptr three_taps(float a, float b, float c, float ratio = 1.0f) {
     auto state = std::make_unique<dorn_resampler_state>();
     state->taps = 2;
@@ -81,8 +83,8 @@ state_ptr three_taps(float a, float b, float c, float ratio = 1.0f) {
     return state;
 }
 
-// The samples that a conversion writes, followed by its code.
-sample_run filtered(const state_ptr &state, const sample_run &in) {
+// Returns the samples that a conversion writes, followed by its code.
+sample_run filter(const state_ptr &state, const sample_run &in) {
     sample_run out(in.size(), 77);
     const int32_t code =
         dorn_resampler_convert(state.get(), in.data(), int32_t(in.size()), &out[0]);
@@ -90,40 +92,40 @@ sample_run filtered(const state_ptr &state, const sample_run &in) {
     return out;
 }
 
-// Sums that no real filter gives. fuzz/stages.cpp tests real ones, ends and channels.
+// Tests sums that no real filter produces. fuzz/stages.cpp tests real filters, ends and channels.
 TEST(ResampleSinc, RoundsAndWrapsSums) {
-    const auto all = [](int16_t sample, float a, float b, float c) {
-        return slice(filtered(three_taps(a, b, c), sample_run(20, sample)), 1, 18);
+    const auto filter_constant = [](int16_t sample, float a, float b, float c) {
+        return slice(filter(three_taps(a, b, c), sample_run(20, sample)), 1, 18);
     };
     // Halves are rounded up.
-    EXPECT_EQ(all(3, 0, 0.5f, 0), sample_run(17, 2));
-    EXPECT_EQ(all(-3, 0, 0.5f, 0), sample_run(17, -1));
+    EXPECT_EQ(filter_constant(3, 0, 0.5f, 0), sample_run(17, 2));
+    EXPECT_EQ(filter_constant(-3, 0, 0.5f, 0), sample_run(17, -1));
     // In tap order and in single precision, 2^24 + 1 stays 2^24.
-    EXPECT_EQ(all(1, 16'777'216.0f, 1, -16'777'214.0f), sample_run(17, 2));
-    // 5,000,000 is 76 * 65,536 + 19,264, and a thousand times as much 76,294 * 65,536 - 3584.
-    EXPECT_EQ(all(5000, 0, 1000.0f, 0), sample_run(17, 19'264));
-    EXPECT_EQ(all(5000, 0, 1e6f, 0), sample_run(17, -3584));
+    EXPECT_EQ(filter_constant(1, 16'777'216.0f, 1, -16'777'214.0f), sample_run(17, 2));
+    // 5,000,000 is 76 * 65,536 + 19,264, and a thousand times as much is 76,294 * 65,536 - 3584.
+    EXPECT_EQ(filter_constant(5000, 0, 1000.0f, 0), sample_run(17, 19'264));
+    EXPECT_EQ(filter_constant(5000, 0, 1e6f, 0), sample_run(17, -3584));
 }
 
-TEST(ResampleSinc, BadArgumentsAndPhases) {
+TEST(ResampleSinc, RefusesBadArgumentsAndPhases) {
     const sample_run in(100, 1);
     sample_run out(100);
-    const auto state = prepared(48000);
+    const auto state = prepare(48000);
     EXPECT_EQ(dorn_resampler_convert(nullptr, in.data(), 100, out.data()), -1);
     EXPECT_EQ(dorn_resampler_convert(state.get(), nullptr, 100, out.data()), -1);
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), 100, nullptr), -1);
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), -1, out.data()), 0);
-    EXPECT_EQ(filtered(prepared(-48000), in).back(), -1);
-    // An even span and a ratio that is not whole: the offset is 0 or 1/2, still the last phase;
-    // with a ratio of 1.125 it is 5/8 at j = 5.
+    EXPECT_EQ(filter(prepare(-48000), in).back(), -1);
+    // With an even number of taps and a ratio that is not whole, the offset is 0 or 1/2, which is
+    // still a valid phase. With a ratio of 1.125 it is 5/8 at j = 5.
     auto drifting = three_taps(0, 1, 0, 1.5f);
     drifting->coef[960][1] = 5.0f;
-    EXPECT_EQ(filtered(drifting, in)[1], 5);
-    EXPECT_EQ(filtered(drifting, in).back(), 66);
+    EXPECT_EQ(filter(drifting, in)[1], 5);
+    EXPECT_EQ(filter(drifting, in).back(), 66);
     drifting->ratio = 1.125f;
-    EXPECT_EQ(slice(filtered(drifting, in), 2, 6), (sample_run{0, 0, 5, 77}));
-    EXPECT_EQ(filtered(drifting, in).back(), -1);
-    // The end is tested in single precision: 2^27 + 10 counts as 2^27 + 16, beyond the input.
+    EXPECT_EQ(slice(filter(drifting, in), 2, 6), (sample_run{0, 0, 5, 77}));
+    EXPECT_EQ(filter(drifting, in).back(), -1);
+    // The end is tested in single precision: 2^27 + 10 rounds to 2^27 + 16, past the input.
     constexpr int32_t kLong = (1 << 27) + 12;
     auto *silence = static_cast<int16_t *>(calloc(kLong, sizeof(int16_t)));
     drifting->taps = 20;
@@ -143,7 +145,7 @@ TEST(ResampleRun, RefusesSizesWithoutALength) {
     }
 }
 
-// An instance with so many bytes of PCM, zero beyond those given.
+// An instance with size bytes of PCM, which starts with bytes; the rest is zero.
 TAVO_CTX with_pcm(size_t size, int32_t rate, const std::string &bytes = {}) {
     TAVO_CTX ctx = {};
     ctx.pcm_bytes = static_cast<int64_t>(size);
@@ -159,8 +161,8 @@ int32_t convert(TAVO_CTX *ctx) {
                             &ctx->ana_len, &ctx->ana);
 }
 
-// A job's conversion may use the memory of the PCM. fuzz/stages.cpp compares dorn_resampler_run
-// with a plain form.
+// A conversion in a job may reuse the memory of the PCM. fuzz/stages.cpp compares
+// dorn_resampler_run with a plain implementation.
 TEST(ResampleRun, InPlaceConversionIsBitIdentical) {
     const std::string bytes = noise(40'003, 5);
     for (const int32_t rate : {8000, 11025, 33075, 44100, 48000, 96000}) {
@@ -169,7 +171,8 @@ TEST(ResampleRun, InPlaceConversionIsBitIdentical) {
             const std::string rest = slice(bytes, off, 40'003);
             TAVO_CTX ctx = with_pcm(rest.size(), rate, rest);
             EXPECT_EQ(convert(&ctx), 0);
-            EXPECT_EQ(taken(ctx.ana, ctx.ana_len), converted(rest.data(), rest.size(), rate));
+            EXPECT_EQ(read_output(ctx.ana, ctx.ana_len),
+                      convert_pcm(rest.data(), rest.size(), rate));
         }
     }
     // Where single precision rounds positions, a block may be offset from its output.
@@ -177,32 +180,11 @@ TEST(ResampleRun, InPlaceConversionIsBitIdentical) {
     const std::string tail = noise(kTail * 8 + 160, 6);
     TAVO_CTX ctx = with_pcm(((1 << 24) + kTail) * 8, 44100);
     memcpy(ctx.pcm + ctx.pcm_bytes / 2 - tail.size() / 2, tail.data(), tail.size());
-    const signal_run want = converted(ctx.pcm, size_t(ctx.pcm_bytes), 44100);
+    const signal_run want = convert_pcm(ctx.pcm, size_t(ctx.pcm_bytes), 44100);
     EXPECT_EQ(convert(&ctx), 0);
     EXPECT_TRUE(
         std::equal(want.end() - kTail - 28, want.end(), ctx.ana + ctx.ana_len - kTail - 20));
     free(ctx.ana);
-}
-
-// A letter for each failing allocation in turn: e error, s silence, . no effect.
-TEST(ResampleRun, EachAllocationFailsInTurn) {
-    for (const auto &[rate, outcomes] :
-         {std::pair{48000, "ee..."},  // state, 16-bit samples; memory that is not taken back
-          {8000, ".ee.."},            // memory that cannot grow: the output has its own
-          {44100, ".eess"},           // lock, condition; parts, flags
-          {22050, "eeess"}}) {        // the output first
-        std::string found;
-        for (int64_t nth = 0; nth < 5; ++nth) {
-            TAVO_CTX ctx = with_pcm(8000, rate, std::string(8000, '\3'));
-            fault::arm({fault::kMemory, nth});
-            const int32_t code = convert(&ctx);
-            fault::disarm();
-            EXPECT_EQ(code == -2, ctx.ana == nullptr);
-            found += code == -2 ? 'e' : ctx.ana[100] == 0.0 ? 's' : '.';
-            free(ctx.ana);
-        }
-        EXPECT_EQ(found, outcomes) << rate;
-    }
 }
 
 }  // namespace

@@ -1,4 +1,4 @@
-"""The installed Python package, with real files. The environment has CMAKE, BUILD and SONGS."""
+"""The installed Python package with real files. The environment defines CMAKE, BUILD and SONGS."""
 import contextlib
 import functools
 import json
@@ -14,7 +14,7 @@ from concurrent.futures import ThreadPoolExecutor
 CMAKE, BUILD, SONGS = os.environ["CMAKE"], os.environ["BUILD"], pathlib.Path(os.environ["SONGS"])
 ROOT = pathlib.Path(__file__).parents[2]
 EXAMPLE = ROOT / "examples" / "beats_against_reference.py"
-JAMS = {  # as its documentation describes a file, an annotation and an observation
+JAMS = {  # required fields of a file, an annotation and an observation, by the documentation of JAMS
     "required": ["annotations", "file_metadata", "sandbox"],
     "properties": {
         "file_metadata": {"required": ["duration", "jams_version"]},
@@ -40,7 +40,7 @@ def run(*words):
     return subprocess.run(words, capture_output=True, text=True, env={**os.environ, "PYTHONPATH": packages})
 
 
-def by_command(*words):
+def run_command(*words):
     return [json.loads(line) for line in run(COMMAND, "--format", "json", *words).stdout.splitlines()]
 
 
@@ -48,7 +48,7 @@ class Package(unittest.TestCase):
     def setUp(self):
         self.enterContext(contextlib.chdir(self.enterContext(tempfile.TemporaryDirectory())))
 
-    def same(self, result, line):
+    def assert_same(self, result, line):
         self.assertEqual((result.path, result.highlight_ms, result.tempo_bpm, result.duration_s, result.sample_rate),
                          (line["file"], line.get("hl_pos_ms"), line.get("bpm"), line["duration_ms"] / 1000,
                           line["sample_rate"]))
@@ -57,19 +57,19 @@ class Package(unittest.TestCase):
 
     def test_same_as_the_command(self):
         self.assertGreater(len(songs), 3)
-        with ThreadPoolExecutor(3) as pool:  # which take turns
+        with ThreadPoolExecutor(3) as pool:  # they run one after another
             for mode in ("highlight", "beats", "both"):
                 results = pool.map(functools.partial(tavo.analyze, mode=mode), songs)
-                for result, line in zip(results, by_command("--mode", mode, *songs), strict=True):
-                    self.same(result, line)
+                for result, line in zip(results, run_command("--mode", mode, *songs), strict=True):
+                    self.assert_same(result, line)
         self.assertEqual(os.listdir(), [])  # no click track
 
     def test_arguments_reach_the_library(self):
-        (line,) = by_command("--length", "10", "--max-beats", "3", songs[0])
+        (line,) = run_command("--length", "10", "--max-beats", "3", songs[0])
         result = tavo.analyze(pathlib.Path(songs[0]), mode="both", length=10, max_beats=3)
-        self.same(result, line)
+        self.assert_same(result, line)
         self.assertNotEqual(len(result.beats), len(tavo.analyze(songs[0]).beats))
-        self.same(next(tavo.analyze_many([songs[0]], "both", 10, 3)), line)
+        self.assert_same(next(tavo.analyze_many([songs[0]], "both", 10, 3)), line)
         for wrong in ({"mode": "all"}, {"length": -1}, {"max_beats": 1 << 31}):
             with self.assertRaises(ValueError):
                 tavo.analyze(songs[0], **wrong)
@@ -129,9 +129,9 @@ class Package(unittest.TestCase):
         self.assertEqual([end.path for end in (first, broken, same, other)], [os.fsdecode(path) for path in paths])
         self.assertIsInstance(broken, tavo.TavoError)
         np.testing.assert_array_equal(first.beats, same.beats)
-        for result, line in zip((first, other), by_command(*songs[:2]), strict=True):
-            self.same(result, line)
-        next(tavo.analyze_many(songs)).path  # left early: the command ends too
+        for result, line in zip((first, other), run_command(*songs[:2]), strict=True):
+            self.assert_same(result, line)
+        next(tavo.analyze_many(songs)).path  # not read to its end: the command ends too
 
     def test_module_is_the_command(self):
         for words in (["--version"], ["missing.wav"]):

@@ -1,4 +1,5 @@
-"""What the repository promises: folders include downwards only, and the library exports and takes what it should.
+"""Checks the repository: folders include only folders below them, and the library exports and imports only the
+intended names.
 Each check is shown to fail. Arguments: the repository, the library."""
 import pathlib
 import re
@@ -8,7 +9,7 @@ import tempfile
 import unittest
 
 ROOT, LIBRARY = (pathlib.Path(sys.argv.pop(1)) for _ in range(2))
-ALLOWED = {  # each folder and the floors below it that it may include
+ALLOWED = {  # each folder and the folders below it that it may include
     "include": set(),
     "common": {"include"},
     "dsp": {"include", "common"},
@@ -23,24 +24,24 @@ ALLOWED = {  # each folder and the floors below it that it may include
     "cli": {"include"},
     "desktop": {"include"},
 }
-SINGLE = {  # headers that a folder may take from one it may not include otherwise
-    # The waveform of a page and the margins of the search, which the public interface does not have.
+EXCEPTIONS = {  # exceptions: headers that a folder may include from other folders
+    # The waveform of a page and the margins of the search, which are not in the public interface.
     "cli": {"media_source/mtsrc.h", "highlight/search.h"},
-    # The desktop implementation includes the codec library's interface and nothing else.
+    # The desktop implementation includes only the interface of the codec library.
     "desktop": {"android/log.h", "media_source/wexaaudio.h", "media_source/mtsrc_io.h"},
 }
-# A codec of a package in this list would tie the library to that package.
+# The codecs of a package in this list would tie the library to that package.
 NEEDED = ("libwexaaudio.so", "liblog.so", "libc.so", "libm.so", "libstdc++.so", "libgcc_s.so", "libpthread.so",
           "ld-linux", "libasan.so", "libubsan.so", "libtsan.so")
-# What a library takes from the compiler and the linker, which every toolchain and sanitizer brings in its own form.
+# Names that the compiler and the linker add; they differ between toolchains and sanitizers.
 RUNTIME = re.compile(r"_ITM_\w+|__gmon_start__|__cxa_\w+|__gxx_personality_v0|_ZSt9terminatev|_Unwind_\w+"
                      r"|__stack_chk_\w+|__tls_\w+|__emutls_\w+|__aarch64_\w+|__(a|t|ub)san_\w+")
-# Where Android's headers or compiler name a function otherwise.
+# Functions that Android's headers or compiler name differently.
 SPELLINGS = {"__errno_location": "__errno", "bcmp": "memcmp"}
 
 
 def includes(root):
-    """Each include of a folder's source: the folder, the file and what it includes."""
+    """Yields each include of a folder's source: the folder, the file and the included path."""
     for folder in ALLOWED:
         for path in sorted((root / folder).rglob("*")):
             if path.suffix in (".h", ".cpp", ".c"):
@@ -48,19 +49,19 @@ def includes(root):
                     yield folder, path.relative_to(root), target
 
 
-def wrong_includes(root):
+def find_wrong_includes(root):
     return [f"{path}: {target}" for folder, path, target in includes(root)
             if target.split("/")[0] not in ALLOWED[folder] | {folder}
-            and target not in SINGLE.get(folder, set())]
+            and target not in EXCEPTIONS.get(folder, set())]
 
 
 def run(*command):
     return subprocess.run(command, check=True, capture_output=True, text=True).stdout
 
 
-def flaws_of(library, names):
-    """Names that only one of both has, libraries asked for that are not in NEEDED, and thread-local storage,
-    whose first use in a loaded library takes memory that may not be there."""
+def find_differences(library, names):
+    """Returns names that only the library or only the list has, needed libraries that are not in NEEDED, and
+    thread-local storage. Its first use in a loaded library allocates memory, which may fail."""
     symbols = run("nm", "-D", "--defined-only", library).splitlines()
     exported = [line.split()[-1].split("@")[0] for line in symbols if line.split()[1] != "A"]  # A: a symbol version
     needed = re.findall(r"\(NEEDED\).*\[(.*)\]", run("readelf", "-d", library))
@@ -70,7 +71,7 @@ def flaws_of(library, names):
 
 
 def imports(library):
-    """The functions that the library takes from outside, without the codec library's."""
+    """Returns the functions that the library imports, except those of the codec library."""
     names = {line.split()[0].split("@")[0] for line in run("nm", "-Du", "--format=posix", library).splitlines()}
     return {SPELLINGS.get(name, name) for name in names if not re.match(r"x[a-z0-9]+_", name)
             and not RUNTIME.fullmatch(name)}
@@ -83,7 +84,7 @@ def words_of(path):
 class Repository(unittest.TestCase):
     def test_include_directions(self):
         self.assertGreater(len([*includes(ROOT)]), 100)
-        self.assertEqual(wrong_includes(ROOT), [])
+        self.assertEqual(find_wrong_includes(ROOT), [])
         for source, target, right in (
                 ("dsp/a.cpp", "dsp/b.h", True), ("dsp/a.cpp", "common/tavo_ctx.h", True),
                 ("dsp/a.cpp", "beat/b.h", False), ("highlight/a.h", "pcm/b.h", False),
@@ -97,20 +98,20 @@ class Repository(unittest.TestCase):
                 path = pathlib.Path(folder, source)
                 path.parent.mkdir(parents=True)
                 path.write_text(f'#include "{target}"\n')
-                self.assertEqual(wrong_includes(pathlib.Path(folder)), [] if right else [f"{source}: {target}"])
+                self.assertEqual(find_wrong_includes(pathlib.Path(folder)), [] if right else [f"{source}: {target}"])
 
     def test_exports(self):
         names = words_of("packaging/exports.txt")
         self.assertEqual(len(names), len(set(names)))
-        self.assertEqual(flaws_of(LIBRARY, names), set())
-        self.assertEqual(flaws_of(LIBRARY, {"tavo_other", *names} - {"tavo_init"}), {"tavo_other", "tavo_init"})
-        # The C library has thread-local storage, a module of the desktop codec library needs the codecs of a package.
+        self.assertEqual(find_differences(LIBRARY, names), set())
+        self.assertEqual(find_differences(LIBRARY, {"tavo_other", *names} - {"tavo_init"}), {"tavo_other", "tavo_init"})
+        # The C library has thread-local storage, and a module of the desktop codec library needs libavcodec.
         libc = re.search(r"\S+/libc\.so\S*", pathlib.Path("/proc/self/maps").read_text())[0]
-        self.assertIn("TLS", flaws_of(libc, []))
-        self.assertIn("libav", " ".join(flaws_of(LIBRARY.parent / "libwexaaudio_av.so", [])))
+        self.assertIn("TLS", find_differences(libc, []))
+        self.assertIn("libav", " ".join(find_differences(LIBRARY.parent / "libwexaaudio_av.so", [])))
 
     def test_imports(self):
-        """Android has all of them."""
+        """Checks that Android has every imported function."""
         known = words_of("tests/android/imports.txt")
         self.assertEqual(imports(LIBRARY) - {*known}, set())
         self.assertIn("pthread_create", imports(LIBRARY))

@@ -1,7 +1,7 @@
-// song_results SONGS [EXPECTED]: analyses every file in the directory SONGS in every way and prints
-// the results as JSON, all digits of milliseconds and BPM. With EXPECTED, the results of another
-// run, it prints what differs instead. Exit status: 0; 1 different, or a song without a result; 2
-// wrong usage.
+// song_results SONGS [EXPECTED]: analyses every file in the directory SONGS in several ways and
+// prints the results as JSON, with all digits of milliseconds and BPM. With EXPECTED, the results
+// of another run, it prints only the differences. Exit status: 0; 1 for a difference or a song
+// without a result; 2 for wrong usage.
 #include <filesystem>
 #include <fstream>
 #include <iostream>
@@ -16,7 +16,7 @@ using nlohmann::json;
 struct way {
     const char *name;
     int32_t mode;
-    int32_t length;  // of the highlight, seconds; 0: none asked for
+    int32_t length;  // of the highlight, seconds, or 0
 };
 
 constexpr way kWays[] = {{"highlight", TAVO_MODE_HIGHLIGHT, 0},
@@ -24,10 +24,11 @@ constexpr way kWays[] = {{"highlight", TAVO_MODE_HIGHLIGHT, 0},
                          {"beats", TAVO_MODE_BEATS, 0},
                          {"both", TAVO_MODE_BOTH, 0}};
 
-json analyse(const std::string &path, const way &how) {
+json analyse(const std::string &path, const way &settings) {
     int32_t err = TAVO_OK;
-    TAVO_CTX *ctx = job::create(path, how.mode, &err);
-    if (ctx == nullptr || tavo_analyze(ctx, how.length, 0, 0) != TAVO_OK) return {{"refused", err}};
+    TAVO_CTX *ctx = job::create(path, settings.mode, &err);
+    if (ctx == nullptr || tavo_analyze(ctx, settings.length, 0, 0) != TAVO_OK)
+        return {{"refused", err}};
     const job::result result = job::wait();
     json found = {{"status", result.status}};
     if (ctx->hl != nullptr) found["highlight_ms"] = result.hl_pos;
@@ -43,8 +44,9 @@ int main(int argc, char **argv) {
     if (argc < 2 || argc > 3) return 2;
     json results;
     for (const auto &song : std::filesystem::directory_iterator(argv[1])) {
-        for (const way &how : kWays) {
-            results[song.path().filename().string()][how.name] = analyse(song.path().string(), how);
+        for (const way &settings : kWays) {
+            results[song.path().filename().string()][settings.name] =
+                analyse(song.path().string(), settings);
         }
     }
     if (argc < 3) {

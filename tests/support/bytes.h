@@ -1,4 +1,4 @@
-// Bytes in tests: strings hold them.
+// Byte strings and files for tests.
 #ifndef TAVO_TESTS_SUPPORT_BYTES_H
 #define TAVO_TESTS_SUPPORT_BYTES_H
 
@@ -16,7 +16,7 @@ inline std::string zeros(size_t count) {
     return std::string(count, '\0');
 }
 
-// Bytes among which no 200 in a row occur twice.
+// Random bytes, in which no sequence of 200 bytes occurs twice.
 inline std::string noise(size_t count, std::mt19937::result_type seed) {
     std::string bytes(count, '\0');
     std::mt19937 random(seed);
@@ -24,7 +24,7 @@ inline std::string noise(size_t count, std::mt19937::result_type seed) {
     return bytes;
 }
 
-// The items of a string or vector in [first, end).
+// The items first to end - 1 of a string or vector.
 template <typename list>
 list slice(const list &items, int64_t first, int64_t end) {
     return {items.begin() + first, items.begin() + end};
@@ -35,7 +35,7 @@ inline std::string contents_of(const std::string &path) {
     return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
 }
 
-// A path that is the running program's own. A file there goes with the record.
+// A path used only by the running program. The destructor deletes the file.
 struct temporary_file {
     std::string path;
 

@@ -1,5 +1,5 @@
-// Calls of memory, threads, locks and files that fail by plan. A program is linked with --wrap for
-// them and with the library's objects: only calls of our own objects are caught, on every thread.
+// Makes calls of memory, thread, lock and file functions fail. The program links them with --wrap
+// and links the library's objects. Only calls from these objects are affected, on every thread.
 #ifndef TAVO_TESTS_SUPPORT_FAULT_LAYER_H
 #define TAVO_TESTS_SUPPORT_FAULT_LAYER_H
 
@@ -21,29 +21,27 @@ enum call : uint32_t {
     kDup = 1 << 7,
     kRead = 1 << 8,
     kSeek = 1 << 9,
-    kClose = 1 << 10,  // closes and then fails
+    kClose = 1 << 10,  // closes the file and then fails
     kFopen = 1 << 11,
     kFwrite = 1 << 12,
 };
 
 struct plan {
-    uint32_t calls = kNothing;  // those that are counted and fail
-    int64_t place = INT64_MAX;  // the one that fails, from 0, all threads counted together
-    bool forever = false;       // and all later ones
-    int error = EIO;            // errno of a failed file call
-    void (*watch)() = nullptr;  // runs at the start of each, failed or not
-    // Runs before each thread's start with what it is to run.
-    void (*thread_watch)(void *(*entry)(void *), void *record) = nullptr;
+    uint32_t calls = kNothing;    // functions that are counted and fail
+    int64_t index = INT64_MAX;    // index of the call that fails; all threads are counted together
+    bool forever = false;         // all later calls fail too
+    int error = EIO;              // errno of a failed file function
+    void (*on_call)() = nullptr;  // called before each counted call
 };
 
-// From now on by this plan. No other thread of the library may run.
+// Starts counting and failing by this plan. No other thread of the library may be running.
 void arm(const plan &next);
 inline void disarm() {
     arm({});
 }
 
-int64_t met();      // calls of the plan, since arm
-int64_t refused();  // of them, those that failed
+int64_t counted_calls();  // counted calls since arm
+int64_t failed_calls();   // failed calls since arm
 
 }  // namespace fault
 

@@ -1,4 +1,4 @@
-// Runs jobs in tests: a callback that counts and copies what it gets.
+// Runs jobs in tests with a callback that counts its calls and copies the result.
 #ifndef TAVO_TESTS_SUPPORT_JOB_HARNESS_H
 #define TAVO_TESTS_SUPPORT_JOB_HARNESS_H
 
@@ -25,10 +25,10 @@ struct result {
 inline std::mutex lock;
 inline std::condition_variable changed;
 inline result last;
-inline void (*inside)(TAVO_INFO *) = nullptr;  // called in the callback
+inline void (*during_callback)(TAVO_INFO *) = nullptr;  // called inside the callback
 
 inline void callback(TAVO_INFO *info) {
-    if (inside != nullptr) inside(info);
+    if (during_callback != nullptr) during_callback(info);
     std::lock_guard<std::mutex> guard(lock);
     ++last.calls;
     last.hl_pos = info->hl_pos;
@@ -45,8 +45,9 @@ inline result wait() {
     return last;
 }
 
-// Null when the report is as the mode and its own status say.
-inline const char *flaw_of(const result &found, int mode) {
+// Returns null if the result is consistent with its mode and status, otherwise the inconsistent
+// part.
+inline const char *find_inconsistency(const result &found, int mode) {
     const auto &list = found.beats;
     const bool beats = found.status == 0 && mode != TAVO_MODE_HIGHLIGHT;
     const auto finite = [](float ms) { return std::isfinite(ms); };
@@ -57,10 +58,10 @@ inline const char *flaw_of(const result &found, int mode) {
     return std::all_of(list.begin(), list.end(), finite) ? nullptr : "times of the beats";
 }
 
-// No job may run: what the one before reported is forgotten.
+// Creates an instance and clears the previous result. No job may be running.
 inline TAVO_CTX *create(const std::string &path, int32_t mode, int32_t *err = nullptr) {
     last = {};
-    inside = nullptr;
+    during_callback = nullptr;
     fnamedec = "";
     const TAVO_PARAM param = {path.c_str(), mode};
     TAVO_CTX *ctx = tavo_init(&param, err);

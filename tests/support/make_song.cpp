@@ -1,5 +1,5 @@
 // make_song OUT.wav [OPTION NUMBER]...
-// Writes a synthetic song, whose tail is its last sixth.
+// Writes a synthetic song with a quiet last sixth.
 #include <cstdio>
 #include <map>
 
@@ -8,10 +8,10 @@
 int main(int argc, char **argv) {
     support::song_spec plan;
     std::map<std::string, double> options = {
-        {"--seconds", plan.seconds},   {"--loud-at", -1.0},  // a third of the song
+        {"--seconds", plan.seconds},   {"--loud-at", -1.0},  // default: a third of the song
         {"--bpm", plan.bpm},           {"--rate", plan.rate},
         {"--channels", plan.channels}, {"--seed", plan.seed},
-        {"--drums", plan.drum_level},  {"--bed", plan.bed_level}};  // parts of full scale
+        {"--drums", plan.drum_level},  {"--bed", plan.bed_level}};  // relative to full scale
     bool good = argc % 2 == 0;
     for (int i = 2; good && i < argc; i += 2) {
         good = options.count(argv[i]) > 0 && sscanf(argv[i + 1], "%lf", &options[argv[i]]) == 1;

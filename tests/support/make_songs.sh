@@ -1,13 +1,13 @@
 #!/bin/sh
-# make_songs.sh MAKE_SONG DIR: makes every song that the tests read, by make_song and Debian's encoders.
+# make_songs.sh MAKE_SONG DIR: makes all songs for the tests, with make_song and Debian's encoders.
 # DIR/codec: every kind of stream and container. DIR/formats: one song in each format. DIR/short: songs
-# whose analysis takes milliseconds. DIR/jni: WAV files. Nothing is done when DIR is
-# complete and newer than this script and the sources of MAKE_SONG.
+# whose analysis takes milliseconds. DIR/jni: WAV files. Does nothing if DIR is complete and newer than
+# this script and the sources of MAKE_SONG.
 set -eu
 make_song=$1
 out=$2
 exec 9>"$out.lock"
-flock 9 # another build's tests
+flock 9 # tests of another build may run
 here=$(dirname "$0")
 if [ -e "$out/.complete" ] && [ -z "$(find "$0" "$here"/*song*.cpp -newer "$out/.complete")" ]; then
   exit 0
@@ -15,7 +15,7 @@ fi
 rm -rf "$out"
 mkdir -p "$out/codec" "$out/formats" "$out/short" "$out/jni"
 
-convert() { # convert IN OUT OPTIONS...: by ffmpeg, without its version in the file
+convert() { # convert IN OUT OPTIONS...: converts with ffmpeg, without its version in the file
   in=$1 to=$2
   shift 2
   ffmpeg -nostdin -v error -y -i "$in" "$@" -map_metadata -1 -fflags +bitexact -flags:a +bitexact "$to"
@@ -50,15 +50,15 @@ flac --totally-silent -5 -o wide.flac wide.wav
 convert song.wav noise.wav -c:a pcm_s24le -af 'aeval=random(0)*1.8-0.9|random(1)*1.8-0.9' -t 6
 flac --totally-silent --lax -0 -b 65535 -o noise.flac noise.wav
 
-# AAC: the encoder uses noise substitution unless told not to, the more the lower the rate
+# AAC. The encoder uses noise substitution by default, more at low rates.
 convert song.wav low.aac -c:a aac -b:a 128k
 convert song48.wav high.aac -c:a aac -b:a 320k -aac_pns 0
 convert mono.wav mono.aac -c:a aac -b:a 64k
 convert six.wav six.aac -c:a aac -b:a 384k -aac_pns 0
-convert song48.wav loud.aac -c:a aac -b:a 320k -aac_pns 0 -af volume=12dB # beyond full scale
+convert song48.wav loud.aac -c:a aac -b:a 320k -aac_pns 0 -af volume=12dB # exceeds full scale
 convert mono.wav core.aac -c:a aac -b:a 32k -ar 22050
 
-# MP4: the same frames in every shape of container
+# MP4: the same frames in different layouts of the container
 convert low.aac last.m4a -c:a copy -bsf:a aac_adtstoasc
 convert low.aac first.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart
 convert high.aac high.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart
@@ -79,8 +79,8 @@ oggenc --quiet -q 2 -s 4 -o six.ogg six.wav
 convert video.avi video.ogv -i song.ogg -map 0:v -map 1:a -c:v libtheora -c:a copy
 convert song48.wav opus.ogg -c:a libopus
 
-# One song in each format: the encoders' delays are known. Every fourth hit is far stronger than the
-# others, so that no small change of the signal chooses other beats.
+# One song in each format; the encoders' delays are known. Every fourth hit is much stronger than the
+# others, so that a small change of the signal does not change the beats.
 cd "$out/formats"
 "$make_song" hits.wav --drums 0.08 --bed 0.37 --seconds 80 --loud-at 31 --seed 2
 "$make_song" accents.wav --drums 0.6 --bed 0 --bpm 30 --seconds 80 --loud-at 31 --seed 9
@@ -93,13 +93,13 @@ lame --quiet -V 2 -t song.wav variable_bare.mp3 # without the encoder's table
 convert song.wav song.aac -c:a aac -b:a 160k
 convert song.aac song.m4a -c:a copy -bsf:a aac_adtstoasc
 oggenc --quiet -q 6 -s 1 -o song.ogg song.wav
-for samples in 576 1024; do # the song as late as the encoders make it
+for samples in 576 1024; do # the song with the delay of the encoders
   convert song.wav "late_$samples.flac" -af "adelay=${samples}S:all=1"
 done
 
-# The brief ones are decoded in one part, the others in four; the long ones have a highlight that is
-# not at their start; the many have more frames than an index first has room for. 11025 Hz goes
-# through the block average, 8000 Hz through the interpolator.
+# "brief" is decoded in one segment, the others in four. The highlight of "long" is not at its start.
+# "many" has more frames than the initial capacity of an index. 11025 Hz uses the block average,
+# 8000 Hz the interpolator.
 cd "$out/short"
 while read -r name seconds loud_at; do
   "$make_song" "$name.wav" --seconds "$seconds" --loud-at "$loud_at" --channels 1 --rate 11025

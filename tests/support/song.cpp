@@ -8,27 +8,29 @@ namespace support {
 namespace {
 
 constexpr double kTwoPi = 6.283185307179586;
-constexpr double kHitSeconds = 0.25;   // a hit has decayed by then
-constexpr double kNoiseDecay = 0.008;  // seconds, the stick: a short burst over the whole band
+constexpr double kHitSeconds = 0.25;   // a hit is silent after this
+constexpr double kNoiseDecay = 0.008;  // seconds, of a stick: a short burst of noise
 constexpr double kKickDecay = 0.06;    // seconds
 constexpr double kKickHz = 62.0;
 constexpr double kFirstHit = 0.5;   // seconds
-constexpr double kQuietGain = 0.2;  // of everything outside the loud section
+constexpr double kQuietGain = 0.2;  // outside the loud section
 constexpr double kChordBeats = 16.0;
-constexpr double kOtherChannels = 0.8;  // of the first channel's bed
-constexpr double kFloor = 0.0008;       // noise floor of full scale: no digital silence, no ties
-// The loud section enters with an accent of the bed and then swells: a loudness curve of
-// overlapping windows has one steepest place near the entry instead of several equal ones.
+constexpr double kOtherChannels = 0.8;  // relative to the first channel's bed
+constexpr double kFloor =
+    0.0008;  // noise floor relative to full scale, which avoids digital silence and ties
+// The loud section starts with an accent of the bed and then swells. Without that, a loudness curve
+// of overlapping windows would have several equally steep steps near the entry.
 constexpr double kAccentSeconds = 0.3;
 constexpr double kAccent = 1.35;
 constexpr double kSwellSeconds = 4.0;
 constexpr double kSwell = 0.15;
-constexpr double kFadeSeconds = 0.01;  // of the bed where the gain changes: no click of its own
-// Each chord is the second, third and fourth harmonic of its root: the bed's spectrum does not
-// change.
+constexpr double kFadeSeconds =
+    0.01;  // duration of a change of the bed's gain, so that it does not click
+// Each chord consists of the second, third and fourth harmonic of its root, so the bed's spectrum
+// does not change.
 constexpr double kRootHz[4] = {110.0, 123.47, 98.0, 130.81};
 
-// xorshift, state never 0. Uniform in [-1, 1).
+// A xorshift generator, uniform in [-1, 1). The state is never 0.
 struct noise {
     uint32_t state;
     double next() {
@@ -39,17 +41,17 @@ struct noise {
     }
 };
 
-noise seeded(uint32_t seed, uint32_t use) {
-    noise made{(seed * 2654435761U) ^ (use * 2246822519U) ^ 0x9E3779B9U};
-    if (made.state == 0) made.state = 1;
-    for (int i = 0; i < 8; ++i) made.next();
-    return made;
+noise seeded(uint32_t seed, uint32_t purpose) {
+    noise generator{(seed * 2654435761U) ^ (purpose * 2246822519U) ^ 0x9E3779B9U};
+    if (generator.state == 0) generator.state = 1;
+    for (int i = 0; i < 8; ++i) generator.next();
+    return generator;
 }
 
 double gain_at(const song_spec &plan, double t) {
     if (t < plan.loud_at || t >= plan.tail_at) return kQuietGain;
-    const double to_go = plan.loud_at > 0.0 ? 1.0 - (t - plan.loud_at) / kSwellSeconds : 0.0;
-    return 1.0 - kSwell * std::fmax(to_go, 0.0);
+    const double rest = plan.loud_at > 0.0 ? 1.0 - (t - plan.loud_at) / kSwellSeconds : 0.0;
+    return 1.0 - kSwell * std::fmax(rest, 0.0);
 }
 
 double bed_gain_at(const song_spec &plan, double t) {
@@ -58,14 +60,14 @@ double bed_gain_at(const song_spec &plan, double t) {
     return gain_at(plan, t) * (accent ? kAccent : 1.0);
 }
 
-// As bed_gain_at, without a step: the bed reaches the new gain kFadeSeconds after the change.
+// bed_gain_at without steps: the bed reaches a new gain after kFadeSeconds.
 double faded_bed_gain_at(const song_spec &plan, double t) {
     double sum = 0.0;
     for (int k = 0; k < 4; ++k) sum += bed_gain_at(plan, t - kFadeSeconds * k / 4.0);
     return sum / 4.0;
 }
 
-// Saturated, so that it is as loud for its peaks as recorded music is.
+// Adds the bed, which is saturated so that its ratio of loudness to peak is that of recorded music.
 void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     noise random = seeded(plan.seed, 100U);
     double phase = random.next() * kTwoPi;
@@ -75,7 +77,8 @@ void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     const double chord_seconds = kChordBeats * 60.0 / plan.bpm;
     for (size_t i = 0; i < out.size(); ++i) {
         const double t = static_cast<double>(i) / plan.rate;
-        // Chords change on the grid of the hits; one whole cycle ahead keeps the index positive.
+        // Chords change on the grid of the hits. Adding one cycle of chords keeps the index
+        // positive.
         const double chord = (t - kFirstHit) / chord_seconds + 4.0;
         phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / plan.rate;
         const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
@@ -84,7 +87,7 @@ void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     }
 }
 
-// strength: around 1. Starts at the sample nearest to t.
+// Adds a hit that starts at the sample nearest to t. strength: around 1.
 void add_hit(const song_spec &plan, double t, double strength, noise &random,
              std::vector<double> &out) {
     const size_t first = static_cast<size_t>(std::llround(t * plan.rate));
@@ -105,27 +108,27 @@ int16_t to_sample(double value) {
 }  // namespace
 
 song make_song(const song_spec &plan) {
-    song made;
-    made.plan = plan;
+    song result;
+    result.plan = plan;
     const size_t frames = static_cast<size_t>(std::llround(plan.seconds * plan.rate));
     const size_t channels = static_cast<size_t>(plan.channels);
     for (double t = kFirstHit; t < plan.seconds;) {
-        made.hits.push_back(t);
-        t = kFirstHit + static_cast<double>(made.hits.size()) * 60.0 / plan.bpm;
+        result.hits.push_back(t);
+        t = kFirstHit + static_cast<double>(result.hits.size()) * 60.0 / plan.bpm;
     }
 
     std::vector<double> drums(frames, 0.0);
     noise strengths = seeded(plan.seed, 1);
     noise bursts = seeded(plan.seed, 2);
-    for (double t : made.hits) add_hit(plan, t, 1.0 + 0.15 * strengths.next(), bursts, drums);
+    for (double t : result.hits) add_hit(plan, t, 1.0 + 0.15 * strengths.next(), bursts, drums);
 
-    made.pcm.resize(frames * channels);
+    result.pcm.resize(frames * channels);
     for (size_t c = 0; c < channels; ++c) {
         std::vector<double> mix = drums;
         add_bed(plan, static_cast<int32_t>(c), mix);
-        for (size_t i = 0; i < frames; ++i) made.pcm[i * channels + c] = to_sample(mix[i]);
+        for (size_t i = 0; i < frames; ++i) result.pcm[i * channels + c] = to_sample(mix[i]);
     }
-    return made;
+    return result;
 }
 
 std::string wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t channels) {
@@ -144,9 +147,9 @@ std::string wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t cha
     return out.append(reinterpret_cast<const char *>(pcm.data()), bytes);
 }
 
-bool write_wav(const std::string &path, const song &what) {
+bool write_wav(const std::string &path, const song &source) {
     std::ofstream file(path, std::ios::binary);
-    file << wav_bytes(what.pcm, what.plan.rate, what.plan.channels) << std::flush;
+    file << wav_bytes(source.pcm, source.plan.rate, source.plan.channels) << std::flush;
     return file.good();
 }
 

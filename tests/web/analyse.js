@@ -1,4 +1,4 @@
-// analyse.js ENGINE.JS SONG.WAV MODE LENGTH: prints what the page's engine finds, as JSON.
+// analyse.js ENGINE.JS SONG.WAV MODE LENGTH: prints the result of the page's engine as JSON.
 const fs = require("fs");
 const [path, song, mode, length] = process.argv.slice(2);
 require(path)({ wasmBinary: fs.readFileSync(path.replace(/js$/, "wasm")) }).then((engine) => {

@@ -1,4 +1,4 @@
-"""tavo.html: the engine gives the command's results, the page takes real files in a browser from disk."""
+"""tavo.html: the engine gives the command's results, and the page opens real files from disk in a browser."""
 import base64
 import json
 import os
@@ -19,7 +19,7 @@ CODECS = {"wav": "pcm_s16le", "flac": "flac", "mp3": "libmp3lame", "m4a": "aac",
           "webm": "libopus", "aac": "aac"}
 FORMATS = {"labels": ".labels.txt", "kdenlive": ".guides.txt", "llc": "-proj.llc", "ffmetadata": ".ffmetadata.txt",
            "edl": ".edl", "reaper": ".reaper.csv"}
-# What the page hands to the engine and what it gets, and what it saves.
+# Records what the page sends to the engine, the replies, and what it saves.
 SPY = """window.wavs = {}; window.saved = {};
 const work_ = work; work = (request, transfer) => {
   if (request.name) { wavs[request.name] = request.wav.slice(0); }
