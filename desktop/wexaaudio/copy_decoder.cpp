@@ -1,5 +1,5 @@
-// The decoders of all codecs: the readers have decoded already, so a frame is finished PCM, and
-// decoding copies it. See shared/stream.h.
+// The decoders of all codecs. The readers have already decoded, so a frame is PCM, and decoding
+// copies it. See shared/stream.h.
 #include <cstdlib>
 #include <cstring>
 
@@ -61,7 +61,7 @@ int32_t xaacd_decode(void * /*decoder*/, const wexa_frame *frame, wexa_output *o
     return 0;
 }
 
-// The set-up data comes first, without a destination.
+// The set-up data comes first, with no output buffer.
 int32_t xvorbisd_decode(void *decoder, const wexa_frame *frame, wexa_output *output,
                         wexa_status *status) {
     if (output->data != nullptr) return xaacd_decode(decoder, frame, output, status);
@@ -83,7 +83,7 @@ void xaacd_delete(void *decoder) {
     free(decoder);
 }
 
-// The other codecs' functions differ from AAC's in their names only.
+// The functions of the other codecs differ from those of AAC only in their names.
 decltype(xaac_init) xmp123_init [[gnu::alias("xaac_init")]];
 decltype(xaac_init) xvorbis_init [[gnu::alias("xaac_init")]];
 decltype(xaac_deinit) xflac_deinit [[gnu::alias("xaac_deinit")]];

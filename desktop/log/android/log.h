@@ -1,7 +1,7 @@
-/* The Android log's writing function, for a desktop: lines go to standard error with priority
- * letter and tag, from priority 6 (error) up unless the environment variable TAVO_LOG names a lower
- * one ("verbose", "debug"). On Android the platform's own header and library replace these.
- */
+/* The Android log's writing function for a desktop. It writes priority letter, tag and message
+ * to standard error. By default it writes errors (priority 6) only; the environment variable
+ * TAVO_LOG selects a lower priority ("verbose", "debug"). On Android the platform's own header
+ * and library replace this. */
 #ifndef TAVO_DESKTOP_LOG_ANDROID_LOG_H
 #define TAVO_DESKTOP_LOG_ANDROID_LOG_H
 
@@ -18,7 +18,7 @@ enum {
     ANDROID_LOG_FATAL = 7
 };
 
-/* printf-like. Returns 1 when the line was written, 0 when its priority is below the limit. */
+/* printf-like. Returns 1 if the line was written, 0 if its priority is too low. */
 __attribute__((format(printf, 3, 4))) int __android_log_print(int prio, const char *tag,
                                                               const char *fmt, ...);
 

@@ -11,18 +11,20 @@ namespace {
 
 constexpr int32_t kHeaderBytes = 7;
 constexpr int32_t kCrcBytes = 2;
-constexpr int32_t kMaxFrameBytes = 8191;  // 13 bits
-constexpr uint32_t kProgramElement = 5;   // identifier of a program configuration in a raw block
+constexpr int32_t kMaxFrameBytes = 8191;  // the length field has 13 bits
+constexpr uint32_t kProgramElement =
+    5;  // identifier of a program configuration element in a raw block
 
 struct adts_header {
     int32_t object_type;
     int32_t rate_index;
     int32_t channels;
     int32_t head;   // bytes before the raw block
-    int32_t bytes;  // of the frame
+    int32_t bytes;  // of the compressed frame
 };
 
-// False when there is no header, or one that announces several raw blocks, whose lengths it lacks.
+// False if there is no header, or if it announces several raw blocks, whose lengths it does not
+// state.
 bool header_at(io_file *file, int64_t offset, adts_header *h) {
     const uint8_t *p = io_file_bytes(file, offset, kHeaderBytes);
     if (p == nullptr || p[0] != 0xFF || (p[1] & 0xF6) != 0xF0) return false;
@@ -34,17 +36,18 @@ bool header_at(io_file *file, int64_t offset, adts_header *h) {
     return h->bytes >= h->head && aac_rate_of_index(h->rate_index) > 0 && (p[6] & 3) == 0;
 }
 
-// Channels may change within a stream (a broadcast's do); the decoder follows.
+// True if both frames may belong to one stream. Channels may change within a stream, as in a
+// broadcast; the decoder follows.
 bool same_stream(const adts_header &a, const adts_header &b) {
     return a.object_type == b.object_type && a.rate_index == b.rate_index;
 }
 
-// The next frame of the stream at or after offset, confirmed by a second one or the end of the
-// file right after it. like: a frame of the stream, null for any stream. Returns its offset, -1
-// when there is none.
-int64_t find_frame(io_file *file, int64_t offset, const adts_header *like, adts_header *h) {
+// Finds the next frame of the stream at or after offset. Another frame or the end of the file must
+// follow it immediately. reference: a frame of the stream, or null for any stream. Returns the
+// offset, or -1.
+int64_t find_frame(io_file *file, int64_t offset, const adts_header *reference, adts_header *h) {
     for (;; ++offset) {
-        int32_t got = 0;  // the frame and the next header are in the buffer, whatever its length
+        int32_t got = 0;  // large enough for the longest frame and the next header
         const uint8_t *p = io_file_peek(file, offset, kMaxFrameBytes + kHeaderBytes, &got);
         if (p == nullptr) return -1;
         const void *sync = memchr(p, 0xFF, static_cast<size_t>(got));
@@ -54,7 +57,7 @@ int64_t find_frame(io_file *file, int64_t offset, const adts_header *like, adts_
         }
         offset += static_cast<const uint8_t *>(sync) - p;
         adts_header after = {};
-        if (header_at(file, offset, h) && (like == nullptr || same_stream(*h, *like)) &&
+        if (header_at(file, offset, h) && (reference == nullptr || same_stream(*h, *reference)) &&
             (offset + h->bytes == file->size ||
              (header_at(file, offset + h->bytes, &after) && same_stream(*h, after)))) {
             return offset;
@@ -62,7 +65,7 @@ int64_t find_frame(io_file *file, int64_t offset, const adts_header *like, adts_
     }
 }
 
-// Finds every whole frame. *first receives the first one's header.
+// Finds every complete frame. *first receives the header of the first one.
 bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header *first) {
     offset = find_frame(file, offset, nullptr, first);
     adts_header h = *first;
@@ -73,7 +76,8 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
         if (header_at(file, end, &next) && same_stream(next, *first)) {
             offset = end;
         } else {
-            // Damage: the next header may also be inside a frame whose stated length is wrong.
+            // The stream is damaged. If the stated length is wrong, the next header may be inside
+            // this frame.
             offset = find_frame(file, offset + h.head, first, &next);
             frame_entry &last = frames->entry[frames->count - 1];
             if (offset >= 0 && offset < end) {
@@ -85,8 +89,8 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
     return frames->count > 0 && !file->failed;
 }
 
-// The configuration from the first frame's header, and from its raw block when the channels are
-// given there.
+// Makes the configuration from the first frame's header or, if the header does not state the
+// channels, from its raw block.
 bool make_config(io_file *file, const adts_header &first, const frame_entry &entry,
                  aac_config *config) {
     aac_config_make(config, first.object_type, first.rate_index, first.channels);

@@ -9,28 +9,29 @@ namespace {
 constexpr int32_t kRates[] = {96000, 88200, 64000, 48000, 44100, 32000, 24000,
                               22050, 16000, 12000, 11025, 8000,  7350};
 constexpr int32_t kRateCount = sizeof kRates / sizeof kRates[0];
-constexpr int32_t kMixdownBits[] = {4, 4, 3};  // mono, stereo, matrix
+constexpr int32_t kMixdownBits[] = {4, 4, 3};  // mono, stereo, matrix mixdown
 constexpr int32_t kIdentifierBits = 3;         // of an element in a raw block
 constexpr int32_t kPlainBytes = 2;             // of a configuration without more elements
-constexpr int32_t kRateEscape = 15;            // 24 bits of Hz follow
+constexpr int32_t kRateEscape = 15;            // the rate follows in 24 bits
 constexpr int32_t kObjectEscape = 31;          // 6 more bits follow
 
-// The core of a stream with spectral band replication has at most half of 48,000 Hz.
+// A stream with spectral band replication has an output rate of up to 48,000 Hz, twice its core
+// rate.
 constexpr int32_t kMaxSbrCore = 24000;
-constexpr int32_t kSbrFrames = 8;     // decoded in search of band replication; usually all have it
-constexpr int32_t kTriedFrames = 64;  // frames tried until one decodes at all
+constexpr int32_t kSbrFrames = 8;  // frames decoded to find band replication; usually all have it
+constexpr int32_t kTriedFrames = 64;  // frames tried until one can be decoded
 
-constexpr int32_t kMaxFrameSamples = 4096;  // as 16-bit pairs well within a source's frame buffer
-constexpr int32_t kMaxBlockBytes = 8191;    // what an ADTS header can state, beyond any real block
+constexpr int32_t kMaxFrameSamples = 4096;  // as 16-bit pairs, well within a source's frame buffer
+constexpr int32_t kMaxBlockBytes = 8191;    // limit of an ADTS header, beyond any real block
 
-// A decoder's noise generator carries history, so each group of frames has a fresh decoder.
-// Opening one costs as much as decoding several frames, which favours large groups; a seek decodes
-// half a group on average, which favours small ones.
+// A decoder's noise generator has a state, so each group of frames has a fresh decoder. Opening a
+// decoder costs as much as decoding several frames, which favours large groups. A seek decodes half
+// a group on average, which favours small ones.
 //
-// One frame suffices for the overlap of low complexity. Band replication has filters and envelopes
-// with a longer memory, and its header may come with every tenth frame only: with a preroll of 8
-// frames the difference is audible. The prediction of other object types remembers more than one
-// frame as well.
+// For low complexity one frame covers the overlap. Band replication has filters and envelopes with
+// a longer memory, and its header may occur only in every tenth frame; with a preroll of 8 frames
+// the difference is audible. The prediction of other object types also remembers more than one
+// frame.
 constexpr int32_t kGroup = 256;
 constexpr int32_t kPreroll = 1;
 constexpr int32_t kLongPreroll = 12;
@@ -53,7 +54,7 @@ uint32_t get(bit_reader *r, int32_t count) {
 
 struct bit_writer {
     uint8_t *data;  // zeroed
-    int64_t at;     // never past kAacMaxConfig * 8: the longest element written has 400 bits
+    int64_t at;     // stays below kAacMaxConfig * 8: the longest element has 400 bits
 };
 
 uint32_t put(bit_writer *w, uint32_t value, int32_t count) {
@@ -81,11 +82,11 @@ void put_general(bit_writer *w, const aac_config &config) {
     put(w, 0, 2);  // no core coder, no extension
 }
 
-// States explicitly that the stream carries spectral band replication (and, parametric, stereo from
-// one channel). Without that, a decoder that starts at a frame without such data never applies it.
-// A configuration that is not a plain low-complexity one is left unchanged.
+// States explicitly that the stream has spectral band replication and, if parametric, stereo from
+// one channel. Otherwise a decoder that starts at a frame without such data would never apply it.
+// Leaves a configuration unchanged unless its object type is low complexity.
 void state_sbr(aac_config *config, bool parametric) {
-    // The output's rate is twice the core's: three places up in the table.
+    // The output's rate is twice the core's, which is three entries up in the table.
     const int32_t extension = config->rate_index - 3;
     if (config->object_type != kAacLowComplexity || config->channels == 0 ||
         aac_rate_of_index(extension) != 2 * aac_rate_of_index(config->rate_index)) {
@@ -102,12 +103,12 @@ void state_sbr(aac_config *config, bool parametric) {
 }
 
 struct block_output {
-    int32_t samples;  // sample frames of a block; 0: it does not decode
+    int32_t samples;  // sample frames of a block; 0 if it cannot be decoded
     int32_t rate;     // Hz
     int32_t channels;
 };
 
-// Decodes a frame alone with a fresh decoder.
+// Decodes a single compressed frame with a fresh decoder.
 block_output decode_alone(io_file *file, const aac_config *config, const frame_entry &entry) {
     const codec_library *library = codec_library_get();
     block_output got = {};
@@ -123,7 +124,7 @@ block_output decode_alone(io_file *file, const aac_config *config, const frame_e
     return got;
 }
 
-// The output of the first frames; of those that decode, the one with the highest rate.
+// Decodes the first frames and returns the output with the highest rate.
 block_output find_output(io_file *file, const aac_config *config, const frame_index *frames) {
     block_output best = {};
     const int32_t core_rate = aac_rate_of_index(config->rate_index);
@@ -169,7 +170,7 @@ bool aac_config_add_program(aac_config *config, const uint8_t *data, int32_t byt
     for (uint32_t i = 0; i < low + data_elements; ++i) copy(&r, &w, 4);
     for (uint32_t i = 0; i < coupling; ++i) copy(&r, &w, 5);
     r.at = (r.at + 7) / 8 * 8;
-    r.at += static_cast<int64_t>(get(&r, 8)) * 8;  // a comment, left out of the copy
+    r.at += static_cast<int64_t>(get(&r, 8)) * 8;  // a comment, which is not copied
     w.at = (w.at + 7) / 8 * 8;
     put(&w, 0, 8);
     config->size = static_cast<int32_t>(w.at / 8);

@@ -1,4 +1,5 @@
-// libwexaaudio_av.so: the part of the library that calls libavcodec. See shared/codec_library.h.
+// libwexaaudio_av.so: the part of the codec library that calls libavcodec. See
+// shared/codec_library.h.
 #include <pthread.h>
 
 #include <algorithm>
@@ -18,17 +19,18 @@ extern "C" {
 struct av_decoder {
     AVCodecContext *ctx;
     AVPacket *packet;
-    AVFrame *frame;  // what the last packet decoded to
-    AVFrame *spare;  // receives further frames of a packet
+    AVFrame *frame;  // output of the last packet
+    AVFrame *spare;  // receives any further frames of a packet
 };
 
 namespace {
 
-constexpr size_t kMaxBlock = size_t{128} << 20;  // bytes that libavutil allocates at once
+constexpr size_t kMaxBlock = size_t{128} << 20;  // most bytes that libavutil allocates at once
 
 pthread_once_t prepare_once = PTHREAD_ONCE_INIT;
 
-// For the whole process: no messages on standard error, no huge blocks for damaged counts.
+// Settings of the whole process: no messages on standard error, no huge allocations for damaged
+// counts.
 void prepare() {
     av_log_set_level(AV_LOG_QUIET);
     av_max_alloc(kMaxBlock);
@@ -63,7 +65,7 @@ bool set_up(av_decoder *d, const char *name, const uint8_t *setup, int32_t setup
     if (d->ctx == nullptr || d->packet == nullptr || d->frame == nullptr || d->spare == nullptr) {
         return false;
     }
-    d->ctx->thread_count = 1;  // sources already run on threads of their own
+    d->ctx->thread_count = 1;  // the sources already use several threads
     d->ctx->flags |= AV_CODEC_FLAG_BITEXACT;
     return set_extra(d->ctx, setup, setup_bytes) && avcodec_open2(d->ctx, codec, nullptr) == 0;
 }
@@ -76,7 +78,7 @@ av_decoder *open_decoder(const char *name, const uint8_t *setup, int32_t setup_b
     return nullptr;
 }
 
-// The packet keeps its buffer from frame to frame, unless libavcodec still refers to it.
+// Returns the packet's data. The packet's buffer is reused unless libavcodec still refers to it.
 uint8_t *make_packet(av_decoder *d, int32_t bytes) {
     AVPacket *packet = d->packet;
     const size_t needed = static_cast<size_t>(bytes) + AV_INPUT_BUFFER_PADDING_SIZE;
@@ -90,7 +92,7 @@ uint8_t *make_packet(av_decoder *d, int32_t bytes) {
     return packet->data;
 }
 
-// The one sample format of the decoders used here is planar float.
+// True if the frame has samples as planar floats, the format of all decoders used here.
 bool is_audio(const AVFrame *frame) {
     return frame->nb_samples >= 0 && frame->ch_layout.nb_channels >= 1 &&
            frame->format == AV_SAMPLE_FMT_FLTP;
@@ -101,7 +103,8 @@ int32_t decode(av_decoder *d) {
     int result = avcodec_send_packet(d->ctx, d->packet);
     if (result == 0) result = avcodec_receive_frame(d->ctx, d->frame);
     if (result == AVERROR(EAGAIN)) return 0;
-    // A damaged packet may hold several frames: the rest must not be output with the next packet.
+    // A damaged packet may contain several frames. The others must not be output with the next
+    // packet.
     while (result == 0 && avcodec_receive_frame(d->ctx, d->spare) == 0) av_frame_unref(d->spare);
     if (result == 0 && is_audio(d->frame)) return d->frame->nb_samples;
     av_frame_unref(d->frame);
@@ -118,13 +121,13 @@ int32_t write_pcm(const av_decoder *d, int32_t channels, int32_t skip, int32_t c
     const AVFrame *frame = d->frame;
     const int32_t n = std::min(frame->nb_samples - skip, count);
     if (skip < 0 || n <= 0) return 0;
-    const int32_t own = frame->ch_layout.nb_channels;
+    const int32_t plane_count = frame->ch_layout.nb_channels;
     const uint8_t *const *plane = frame->extended_data;
     if (channels == 1) {
-        pcm16_mean(plane, own, skip, pcm, n);
+        pcm16_mean(plane, plane_count, skip, pcm, n);
     } else {
         pcm16_pair(reinterpret_cast<const float *>(plane[0]) + skip,
-                   reinterpret_cast<const float *>(plane[own > 1 ? 1 : 0]) + skip, pcm, n);
+                   reinterpret_cast<const float *>(plane[plane_count > 1 ? 1 : 0]) + skip, pcm, n);
     }
     return n;
 }
@@ -135,8 +138,8 @@ vorbis_parser *open_parser(const uint8_t *setup, int32_t setup_bytes) {
 }
 
 void close_parser(vorbis_parser *parser) {
-    auto *own = reinterpret_cast<AVVorbisParseContext *>(parser);
-    av_vorbis_parse_free(&own);
+    auto *context = reinterpret_cast<AVVorbisParseContext *>(parser);
+    av_vorbis_parse_free(&context);
 }
 
 int32_t parse_samples(vorbis_parser *parser, uint8_t first) {

@@ -5,25 +5,25 @@
 
 namespace {
 
-// Four samples side by side, by the compiler's vector extension.
+// Four samples in one register, by the compiler's vector extension.
 typedef float float_quad __attribute__((vector_size(16)));
 typedef int32_t int_quad __attribute__((vector_size(16)));
 typedef uint32_t bits_quad __attribute__((vector_size(16)));
 constexpr ptrdiff_t kQuad = 4;
-static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__);  // of two samples in one word
+static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__);  // two samples share a word
 
 constexpr float kScale = 32768.0f;
 
 // Adding 1.5 x 2^23 leaves the nearest integer (ties to even, as lrintf) in the low bits of a float
-// of magnitude below 2^22.
+// whose magnitude is below 2^22.
 constexpr float kRoundMagic = 12582912.0f;
 constexpr int32_t kRoundMagicBits = 0x4B400000;
 
-// The first count samples at from, 1 to kQuad, as integers of 16 bits; the others are 0.
-inline int_quad round_clip(const float *from, ptrdiff_t count) {
+// Converts the first count samples, 1 to kQuad, to integers of 16 bits; the other lanes are 0.
+inline int_quad round_clip(const float *samples, ptrdiff_t count) {
     constexpr float_quad kMost = {32767.0f, 32767.0f, 32767.0f, 32767.0f};
     float_quad in = {};
-    memcpy(&in, from, static_cast<size_t>(count) * sizeof *from);
+    memcpy(&in, samples, static_cast<size_t>(count) * sizeof *samples);
     float_quad v = in * kScale;
     v = in == in ? v : float_quad{};
     v = v < kMost ? v : kMost;
@@ -34,7 +34,7 @@ inline int_quad round_clip(const float *from, ptrdiff_t count) {
     return bits - kRoundMagicBits;
 }
 
-// Calls step(i, samples) for each quad of count samples and for what is left.
+// Calls step(i, samples) for each quad of count samples and for the remainder.
 template <typename Step>
 inline void for_quads(ptrdiff_t count, Step step) {
     ptrdiff_t i = 0;
@@ -61,7 +61,7 @@ void pcm16_mean(const uint8_t *const *plane, int32_t channels, int32_t skip, int
             sum += round_clip(reinterpret_cast<const float *>(plane[c]) + skip + i, n);
         }
         if (channels == 2) {
-            sum = (sum - (sum >> 31)) >> 1;  // the division below, toward zero
+            sum = (sum - (sum >> 31)) >> 1;  // divides by 2, toward zero
         } else if (channels > 2) {
             sum /= channels;
         }

@@ -1,8 +1,8 @@
-// FLAC files, decoded by libFLAC. Positions are the sample numbers of the frames, so that a frame
-// that is missing or cannot be decoded becomes silence of its length.
+// FLAC files, decoded by libFLAC. Positions come from the frames' sample numbers, so a missing or
+// undecodable frame becomes silence of its length.
 //
-// In: mtsrc_io. Out: front left and right as 16-bit pairs, one channel twice; the information
-// record.
+// In: mtsrc_io. Out: 16-bit pairs of front left and right, or of a single channel twice; the
+// information record.
 #include <FLAC/stream_decoder.h>
 
 #include <algorithm>
@@ -16,34 +16,35 @@
 
 namespace {
 
-constexpr int32_t kPair = 2 * sizeof(int16_t);  // bytes
-constexpr int64_t kTail = 65'536;  // bytes at the file's end, decoded first to find the last block
+constexpr int32_t kPair = 2 * sizeof(int16_t);  // frames, or 0 if there are no groups
+constexpr int64_t kTail =
+    65'536;  // bytes at the end of the file, decoded first to find the last block
 
-// Sample frames believed for each byte of the file. Digital silence has 290 in the
-// encoder's default blocks of 4096, and 1200 in the largest blocks of a streamable file.
+// Sample frames per byte of the file, at most; more are not believed. Digital silence has 290 in
+// the encoder's default blocks of 4096, and 1200 in the largest blocks of a streamable file.
 constexpr int64_t kMaxSamplesPerByte = 2048;
 
 // One pass through the blocks of a file.
 struct flac_stream {
     io_file *file;
     FLAC__StreamDecoder *decoder;  // owned
-    int64_t at;                    // offset that the decoder reads next
+    int64_t at;                    // offset of the next byte that the decoder reads
     int32_t max_block;             // sample frames
     int64_t base;                  // number of the stream's first sample
-    int16_t *pcm;                  // [max_block][2] owned; the block decoded last
-    int64_t block;                 // its first sample
-    int32_t count;                 // its sample frames; 0 without one
-    bool damaged;                  // the frame being decoded has a wrong check sum
+    int16_t *pcm;                  // [max_block][2] owned; the last decoded block
+    int64_t block;                 // first sample of the block
+    int32_t count;                 // sample frames of the block, or 0
+    bool damaged;                  // the current frame has a wrong check sum
 };
 
 struct flac_reader {
     uint8_t reserved[kFlacReaderFlag];
-    uint8_t flag;  // set by the source before every read; nothing depends on it
+    uint8_t flag;  // the source sets it before every read; it has no effect
     io_file file;
     flac_stream stream;
     const stream_info *info;  // shared by the readers of the file
-    int64_t next;             // sample delivered next
-    bool moved;               // after a seek, until the decoder follows
+    int64_t next;             // next sample to deliver
+    bool moved;               // a seek was requested, and the decoder has not followed
 };
 static_assert(offsetof(flac_reader, flag) == kFlacReaderFlag);
 
@@ -62,7 +63,7 @@ FLAC__StreamDecoderReadStatus read_bytes(const FLAC__StreamDecoder * /*decoder*/
                     : FLAC__STREAM_DECODER_READ_STATUS_CONTINUE;
 }
 
-// Stores a block as pairs of 16 bits.
+// Stores a block as 16-bit pairs.
 void store_pairs(const FLAC__int32 *left, const FLAC__int32 *right, int32_t bits, int32_t count,
                  int16_t *pcm) {
     const auto store = [&](auto convert) {
@@ -73,13 +74,14 @@ void store_pairs(const FLAC__int32 *left, const FLAC__int32 *right, int32_t bits
     };
     const int32_t up = 16 - bits;
     if (up >= 0) return store([=](FLAC__int32 x) { return static_cast<uint32_t>(x) << up; });
-    const int32_t half = 1 << (bits - 17);  // rounded to nearest, up at half; the top is clipped
+    const int32_t half = 1 << (bits - 17);  // rounds to nearest, halves up; clips at the top
     store([&](FLAC__int32 x) {
         return std::min((x >> (bits - 16)) + ((x & half) != 0 ? 1 : 0), 32767);
     });
 }
 
-// Ignores a frame with a wrong check sum: not even its number can be trusted.
+// Stores a decoded frame as the block. Ignores a frame with a wrong check sum, because even its
+// number may be wrong.
 FLAC__StreamDecoderWriteStatus store_block(const FLAC__StreamDecoder * /*decoder*/,
                                            const FLAC__Frame *frame,
                                            const FLAC__int32 *const buffer[], void *client) {
@@ -138,7 +140,7 @@ void close_stream(flac_stream *s) {
     free(s->pcm);
 }
 
-// Decodes the next block that can be used. False at the end of what is readable.
+// Decodes the next usable block. False if no further block can be read.
 bool decode_block(flac_stream *s) {
     s->count = 0;
     while (s->count == 0) {
@@ -149,16 +151,16 @@ bool decode_block(flac_stream *s) {
     return true;
 }
 
-// Decodes the block that holds a sample and makes it start there. False when there is none.
+// Decodes the block that contains a sample, starting at that sample. False on failure.
 bool find_sample(flac_stream *s, int64_t sample) {
     s->count = 0;
     s->damaged = false;
     const auto number = static_cast<FLAC__uint64>(s->base + sample);
-    return FLAC__stream_decoder_flush(s->decoder) != 0 &&  // out of a seek that failed
+    return FLAC__stream_decoder_flush(s->decoder) != 0 &&  // leaves the state of a failed seek
            FLAC__stream_decoder_seek_absolute(s->decoder, number) != 0 && s->count > 0;
 }
 
-// The end of the last block that begins at or after an offset of the file; 0 without one.
+// End of the last block that begins at or after an offset in the file, or 0.
 int64_t last_end(flac_stream *s, int64_t offset) {
     s->damaged = false;
     s->at = offset;
@@ -172,8 +174,8 @@ int64_t last_end(flac_stream *s, int64_t offset) {
     return end;
 }
 
-// Finds where the audio ends, which may differ from the stream information: at the end of the last
-// block, searched from the file's end. False when there is no plausible end.
+// Finds the end of the audio, which may differ from the stream information: the end of the last
+// block, searched from the end of the file. False if no plausible end is found.
 bool find_end(flac_stream *s, int64_t *end) {
     const int64_t size = s->file->size;
     for (int64_t tail = kTail; *end == 0 && !s->file->failed; tail *= 4) {
@@ -221,7 +223,7 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     flac_stream *s = &r->stream;
     if (r->next >= r->info->end) return kWexaEndOfStream;
     if (r->moved && !find_sample(s, r->next)) {
-        // Where seeking fails, the stream is read from the start up to the position.
+        // If seeking fails, the stream is read from the start up to the position.
         r->file.failed = false;
         s->count = 0;
         if (FLAC__stream_decoder_reset(s->decoder) == 0) return -1;
@@ -231,7 +233,7 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     bool more = true;
     while (more && (s->count == 0 || s->block + s->count <= r->next)) more = decode_block(s);
     if (r->file.failed) return -1;
-    const int64_t inside = r->next - s->block;  // below 0 in silence before the block
+    const int64_t inside = r->next - s->block;  // below 0 in the silence before the block
     const int64_t left = std::min<int64_t>(r->info->end - r->next, size / kPair);
     const int64_t samples = std::min(left, !more ? left : inside < 0 ? -inside : s->count - inside);
     *bytes = static_cast<int32_t>(samples) * kPair;

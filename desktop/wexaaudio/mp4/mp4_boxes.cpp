@@ -8,12 +8,13 @@
 
 namespace {
 
-constexpr int32_t kMaxBoxes = 65536;    // of one level; real files have far fewer
-constexpr int64_t kFullHead = 4;        // bytes: version and flags of a box that has them
-constexpr int64_t kMaxTable = 1 << 26;  // bytes; a day of frames needs less
+constexpr int32_t kMaxBoxes = 65536;    // in one level; real files have far fewer
+constexpr int64_t kFullHead = 4;        // bytes: version and flags, if a box has them
+constexpr int64_t kMaxTable = 1 << 26;  // bytes; a day of audio needs less
 
-// Bytes of the file for each frame that it is believed to have. The shortest AAC frame of silence
-// has 4, and 4 more in the tables; frames that share their bytes would take memory without limit.
+// Bytes of the file per frame, at least; more frames are not believed. The shortest AAC frame of
+// silence has 4 bytes, plus 4 in the tables. Frames that share their bytes would take memory
+// without limit.
 constexpr int64_t kMinFrameBytes = 2;
 
 constexpr uint32_t name_of(const char (&text)[5]) {
@@ -22,7 +23,7 @@ constexpr uint32_t name_of(const char (&text)[5]) {
     return name;
 }
 
-// The offsets of a box's contents, or of a level of boxes; from == to: it does not exist.
+// Offsets of the contents of a box, or of a level of boxes. If from == to, it does not exist.
 struct span {
     int64_t from;
     int64_t to;
@@ -35,7 +36,7 @@ struct box {
     span body;
 };
 
-// Bytes of a track's frames in fragments that state none.
+// Size of a track's frames in fragments that do not state it.
 struct frame_default {
     uint32_t track_id;
     uint32_t bytes;
@@ -45,20 +46,20 @@ struct parser {
     io_file *file;
     stream_info *info;
     mp4_codec *codec;
-    uint32_t track_id;                   // of the audio track
-    frame_default defaults[kMaxTracks];  // default_count used
+    uint32_t track_id;                   // the audio track's
+    frame_default defaults[kMaxTracks];  // the first default_count are used
     int32_t default_count;
-    bool ended;  // a frame was past the end of the file: the list ends before it
+    bool ended;  // a frame was past the end of the file, so the list ends
 };
 
-// Unsigned, big-endian; 0 when p is null.
+// Reads an unsigned big-endian number. 0 if p is null.
 uint64_t big_endian(const uint8_t *p, int32_t bytes) {
     uint64_t v = 0;
     for (int32_t i = 0; p != nullptr && i < bytes; ++i) v = v << 8 | p[i];
     return v;
 }
 
-// 0 where the file has no such bytes.
+// Reads a number from the file. 0 if the file does not contain all its bytes.
 uint64_t number(io_file *file, int64_t offset, int32_t bytes) {
     return big_endian(io_file_bytes(file, offset, bytes), bytes);
 }
@@ -67,8 +68,8 @@ uint32_t be32(io_file *file, int64_t offset) {
     return static_cast<uint32_t>(number(file, offset, 4));
 }
 
-// Removes the next box from the front of a level; one that states that it is longer than the level
-// ends with it. False when there is none.
+// Removes the next box from the start of a level. A box that states to be longer than the level is
+// shortened to it. False if no box is left.
 bool next_box(io_file *file, span *level, box *b) {
     const int64_t left = level->to - level->from;
     if (left < 8 || level->boxes++ == kMaxBoxes) return false;
@@ -87,7 +88,7 @@ bool next_box(io_file *file, span *level, box *b) {
     return true;
 }
 
-// Removes the boxes up to the next one of a name.
+// Removes the boxes up to and including the next one with this name.
 bool next_named(io_file *file, span *level, uint32_t name, box *b) {
     while (next_box(file, level, b)) {
         if (b->name == name) return true;
@@ -95,7 +96,7 @@ bool next_named(io_file *file, span *level, uint32_t name, box *b) {
     return false;
 }
 
-// The first box of a name in a level.
+// Finds the first box with this name in a level.
 span find(io_file *file, span level, uint32_t name) {
     box b = {};
     return next_named(file, &level, name, &b) ? b.body : span{0, 0};
@@ -106,7 +107,7 @@ span find(io_file *file, span level, uint32_t name, Names... deeper) {
     return find(file, find(file, level, name), deeper...);
 }
 
-// A descriptor's tag and contents at the front of a span.
+// Reads a descriptor's tag and removes everything except its contents from the span.
 uint8_t descriptor(io_file *file, span *level) {
     const auto tag = static_cast<uint8_t>(number(file, level->from++, 1));
     int64_t size = 0;
@@ -118,7 +119,7 @@ uint8_t descriptor(io_file *file, span *level) {
     return level->from <= level->to ? tag : uint8_t{0};
 }
 
-// The elementary stream descriptor: object type and, for AAC, the configuration.
+// Reads the elementary stream descriptor: the object type and, for AAC, the configuration.
 void read_esds(const parser &p, span esds) {
     constexpr int64_t kObjectHead = 13;  // bytes: object type, stream type, buffer, bit rates
     esds.from += kFullHead;
@@ -138,9 +139,9 @@ void read_esds(const parser &p, span esds) {
         aac_config_read(&p.codec->config, io_file_bytes(p.file, esds.from, bytes), bytes);
 }
 
-// The first sample description of the track.
+// Reads the first sample description of the track.
 void read_codec(const parser &p, span stsd) {
-    // Bytes of the entry before its boxes: of ISO, and of QuickTime's versions 1 and 2.
+    // Bytes of the entry before its boxes, in ISO files and in QuickTime's versions 1 and 2.
     constexpr int64_t kEntryHeads[] = {28, 28 + 16, 28 + 36};
     box entry = {};
     stsd.from += kFullHead + 4;
@@ -155,8 +156,8 @@ void read_codec(const parser &p, span stsd) {
     if (entry.name == name_of("mp4a") && esds.to > 0) read_esds(p, esds);
 }
 
-// Skips a frame without bytes. False when out of memory and when the frames are too many for the
-// file.
+// Adds a frame unless it has no bytes. False if memory runs out or the file is too small for so
+// many frames.
 bool add_frame(parser *p, int64_t offset, int64_t bytes) {
     if (bytes == 0) return true;
     frame_index *frames = &p->info->frames;
@@ -165,10 +166,10 @@ bool add_frame(parser *p, int64_t offset, int64_t bytes) {
                         frame_index_add(frames, offset, static_cast<int32_t>(bytes), 0));
 }
 
-// A table box's contents after version and flags, in memory: the tables are read in parallel and
-// may be far apart.
+// Contents of a table box after version and flags. The tables are read in parallel and may be far
+// apart, so they are loaded.
 struct table {
-    uint8_t *data;  // owned; null when missing, too long, or out of memory
+    uint8_t *data;  // owned; null if missing or too long, or if memory ran out
     int64_t bytes;
 };
 
@@ -182,18 +183,18 @@ table load(io_file *file, span body) {
     return t;
 }
 
-// 0 past the end.
+// The number at an offset, or 0 if it is past the end.
 int64_t value(const table &t, int64_t at, int32_t width) {
     const bool inside = at >= 0 && at + width <= t.bytes;
     return static_cast<int64_t>(big_endian(inside ? t.data + at : nullptr, width));
 }
 
-// The tables of a track: how many frames each chunk has, where the chunks are, the frames' sizes.
+// The tables of a track: frames per chunk, offsets of the chunks, sizes of the frames.
 struct tables {
     table runs;    // "stsc": count; first chunk, frames in each, description (32 bits each)
     table chunks;  // "stco", "co64": count; offsets of chunk_width
     table sizes;   // "stsz": size of all frames or 0, count, sizes; "stz2": bits, count, sizes
-    int32_t chunk_width;  // bytes
+    int32_t chunk_width;  // frames, or 0 if there are no groups
     int32_t size_bits;
     int64_t count;  // frames
 };
@@ -250,7 +251,7 @@ bool read_tables(parser *p, span stbl) {
     return ok;
 }
 
-// Reads the tracks' defaults of fragments from the box "mvex".
+// Reads the tracks' defaults for fragments from the box "mvex".
 void read_defaults(parser *p, span mvex) {
     box trex = {};
     while (p->default_count < kMaxTracks && next_named(p->file, &mvex, name_of("trex"), &trex)) {
@@ -266,7 +267,7 @@ uint32_t default_size(const parser *p, uint32_t track_id) {
     return 0;
 }
 
-// Reads one run of frames of a track in a fragment; *offset moves to the end of the frames.
+// Reads one run of a track's frames in a fragment. Moves *offset to the end of the frames.
 bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64_t *offset) {
     const uint32_t flags = be32(p->file, run.from);
     const int64_t count = be32(p->file, run.from + kFullHead);
@@ -276,12 +277,12 @@ bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64
         at += 4;
     }
     if ((flags & 0x4) != 0) at += 4;                      // flags of the first frame
-    const int64_t before = (flags & 0x100) != 0 ? 4 : 0;  // its duration
+    const int64_t before = (flags & 0x100) != 0 ? 4 : 0;  // each frame's duration
     const bool sized = (flags & 0x200) != 0;
     const int64_t entry =
         before + (sized ? 4 : 0) + ((flags & 0x400) != 0 ? 4 : 0) + ((flags & 0x800) != 0 ? 4 : 0);
     const int64_t end = p->file->size;
-    if (!sized && (size == 0 || !ours)) {  // nothing but the file bounds the count
+    if (!sized && (size == 0 || !ours)) {  // only the file's size limits the count
         *offset = std::min(*offset, end) + (size > 0 ? std::min(count, end / size + 1) * size : 0);
         return true;
     }
@@ -293,8 +294,8 @@ bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64
     return true;
 }
 
-// Reads all runs of one track of a fragment. *offset: where its frames start unless it states
-// otherwise; moves to their end.
+// Reads all runs of one track of a fragment. *offset is where its frames start, unless the fragment
+// states otherwise; moves it to their end.
 bool read_track_runs(parser *p, int64_t moof, span traf, int64_t *offset) {
     io_file *file = p->file;
     const span head = find(file, traf, name_of("tfhd"));
@@ -317,7 +318,7 @@ bool read_track_runs(parser *p, int64_t moof, span traf, int64_t *offset) {
     return true;
 }
 
-// Reads the kinds of the tracks and the tables of the first audio track.
+// Reads the kinds of all tracks and the tables of the first audio track.
 bool read_movie(parser *p, span moov) {
     io_file *file = p->file;
     stream_info *info = p->info;

@@ -1,4 +1,4 @@
-// MP4: the first audio track, AAC or MPEG Layer III. A demuxer has that one stream, and the stream
+// MP4: the first audio track, AAC or MPEG Layer III. A demuxer has only this stream, and the stream
 // handle is the demuxer itself.
 //
 // In: mtsrc_io. Out: PCM, the information records.
@@ -12,10 +12,12 @@
 
 namespace {
 
-// Frames searched for a header that states rate and length; the first one has it unless damaged.
+// Frames searched for a header that states rate and length. Unless it is damaged, the first one has
+// it.
 constexpr int64_t kTriedFrames = 64;
 
-// Rate, channels and frame length of a Layer III track come from its frames: all have one length.
+// Reads rate, channels and frame length of a Layer III track from its frames, which all have the
+// same length.
 bool read_mpeg_format(io_file *file, stream_info *info) {
     mpeg_header h = {};
     bool known = false;

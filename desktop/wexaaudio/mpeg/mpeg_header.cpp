@@ -9,11 +9,12 @@ constexpr int32_t kVersionReserved = 1;
 constexpr int32_t kVersion1 = 3;
 constexpr int32_t kVersion25 = 0;
 constexpr int32_t kModeMono = 3;
-constexpr int32_t kVbriAt = 36;  // bytes from the frame's start, whatever its side information
+constexpr int32_t kVbriAt = 36;  // bytes from the start of the frame, whatever its side information
 
-constexpr int32_t kRates[3] = {44100, 48000, 32000};  // Hz, MPEG-1; halved and quartered for 2, 2.5
+constexpr int32_t kRates[3] = {44100, 48000,
+                               32000};  // Hz for MPEG-1; a half for 2, a quarter for 2.5
 
-// kbit/s by [MPEG-1 first][layer - 1][bitrate index]
+// kbit/s by [MPEG-1 first][layer - 1][bitrate index].
 constexpr int32_t kBitrates[2][3][15] = {
     {{0, 32, 64, 96, 128, 160, 192, 224, 256, 288, 320, 352, 384, 416, 448},
      {0, 32, 48, 56, 64, 80, 96, 112, 128, 160, 192, 224, 256, 320, 384},
@@ -29,7 +30,7 @@ int32_t frame_bytes(const mpeg_header &h, int32_t kbits, int32_t padding) {
     return factor * bits / h.rate + padding;
 }
 
-// Bytes from a Layer III frame's start to its main data.
+// Bytes from the start of a Layer III frame to its main data.
 int32_t main_data_at(const mpeg_header *h) {
     const int32_t side =
         h->version == 1 ? (h->channels == 1 ? 17 : 32) : (h->channels == 1 ? 9 : 17);
@@ -81,8 +82,8 @@ void mpeg_describe(const mpeg_header *head, stream_info *info) {
     info->rate = head->rate;
     info->channels = head->channels;
     info->out_channels = head->channels;
-    // The filter bank's memory spans two frames at most (Layer I; Layer III of MPEG-2). One more is
-    // margin, since it costs next to nothing.
+    // The filter bank remembers at most two frames (Layer I; Layer III of MPEG-2). A third is a
+    // cheap margin.
     info->preroll = 3;
     info->reservoir = head->layer == 3 ? kMpegMaxBackstep : 0;
     info->overhead = main_data_at(head);

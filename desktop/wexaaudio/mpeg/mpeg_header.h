@@ -1,4 +1,4 @@
-// The four bytes that start every MPEG audio frame (ISO/IEC 11172-3, 13818-3 and its 2.5
+// The four bytes at the start of every MPEG audio frame (ISO/IEC 11172-3, 13818-3 and its 2.5
 // extension), and the parts of a frame's body that the reader needs.
 #ifndef WEXAAUDIO_MPEG_HEADER_H
 #define WEXAAUDIO_MPEG_HEADER_H
@@ -8,8 +8,9 @@
 #include "desktop/wexaaudio/shared/scan_cache.h"
 
 constexpr int32_t kMpegHeaderBytes = 4;
-constexpr int32_t kMpegMaxFrame = 1732;    // bytes: Layer II, 384 kbit/s at 32 kHz, padded
-constexpr int32_t kMpegMaxBackstep = 511;  // bytes of main data that a Layer III frame reaches back
+constexpr int32_t kMpegMaxFrame = 1732;  // bytes: Layer II, 384 kbit/s at 32 kHz, padded
+constexpr int32_t kMpegMaxBackstep =
+    511;  // bytes that a Layer III frame's main data may start before the frame
 
 struct mpeg_header {
     int32_t version;   // 1, 2, or 25 for 2.5
@@ -17,21 +18,21 @@ struct mpeg_header {
     int32_t rate;      // Hz
     int32_t channels;  // 1 or 2
     int32_t samples;   // sample frames
-    int32_t bytes;     // of the frame
-    bool has_crc;      // two bytes after the header
+    int32_t bytes;     // of the compressed frame
+    bool has_crc;      // two bytes follow the header
 };
 
-// False when the four bytes are not a header, or one of free format, which states no length.
+// Parses four bytes. False if they are not a header, or one of free format, which states no length.
 bool mpeg_parse(const uint8_t *p, mpeg_header *h);
 
-// Same version, layer and rate: frames of one stream.
+// True if both frames may belong to one stream: same version, layer and rate.
 bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
 
-// True if a stream's first frame holds an encoder's table (Xing, Info, VBRI) instead of music. p
-// holds the frame, bytes of it.
+// True if a stream's first frame contains an encoder's table (Xing, Info, VBRI) instead of music.
+// p: the frame's first bytes bytes.
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
 
-// Fills in how a stream of such frames is decoded, bare or in a container.
+// Sets how a stream of such frames is decoded, bare or in a container.
 void mpeg_describe(const mpeg_header *head, stream_info *info);
 
 #endif

@@ -16,23 +16,23 @@ constexpr int32_t kDropRate = 44100;  // Hz
 constexpr int32_t kId3v1Bytes = 128;
 constexpr int32_t kApeFooter = 32;            // bytes, also of the header
 constexpr int32_t kLook = 4 * kMpegMaxFrame;  // bytes read to confirm a header
-constexpr int32_t kFirstChain = 3;            // headers in a row that start the stream
-constexpr int32_t kResyncChain = 2;           // and that continue it after garbage
+constexpr int32_t kFirstChain = 3;            // headers in a row that mark the start of the stream
+constexpr int32_t kResyncChain = 2;           // headers in a row that continue it after garbage
 
 struct mpeg_scan {
     io_file *file;
-    int64_t end;       // of the audio: where the tags at the file's end begin
+    int64_t end;       // end of the audio: start of the tags at the end of the file
     int64_t at;        // offset
-    mpeg_header head;  // of the stream's first frame, once started
+    mpeg_header head;  // header of the first frame, once started
     bool started;
 };
 
-// Bytes of the tag that ends at end; 0 without one. Tags are walked backwards: what is not held is
-// read together with the bytes before it.
+// Returns the bytes of the tag that ends at end, or 0. Tags are read backwards; a tag that is not
+// in the buffer is read together with the bytes before it.
 int64_t tag_before(io_file *file, int64_t end) {
-    const bool held = end - kId3v1Bytes >= file->block_at;
+    const bool buffered = end - kId3v1Bytes >= file->block_at;
     int32_t got = 0;
-    if (!held) io_file_peek(file, std::max<int64_t>(end - kIoBlock, 0), 1, &got);
+    if (!buffered) io_file_peek(file, std::max<int64_t>(end - kIoBlock, 0), 1, &got);
     const uint8_t *p = io_file_bytes(file, end - kId3v1Bytes, kId3v1Bytes);
     if (p == nullptr) return 0;
     if (memcmp(p, "TAG", 3) == 0) return kId3v1Bytes;
@@ -44,36 +44,36 @@ int64_t tag_before(io_file *file, int64_t end) {
     return size >= kApeFooter && whole <= end ? whole : 0;
 }
 
-// Finds where the audio ends: before any ID3v1 and APE tags.
+// Finds the end of the audio, before any ID3v1 and APE tags.
 int64_t find_end(io_file *file) {
     int64_t end = file->size;
     for (int64_t tag = -1; tag != 0; end -= tag) tag = tag_before(file, end);
     return end;
 }
 
-// True if p (got bytes, to_end bytes of audio) starts a chain of headers of one stream, or one that
-// ends exactly with the audio.
+// True if p starts a chain of headers of one stream. The chain may be shorter if it ends exactly at
+// the end of the audio. p has got bytes; to_end bytes of audio are left.
 bool starts_chain(const mpeg_scan *s, const uint8_t *p, int32_t got, int64_t to_end,
                   mpeg_header *first) {
-    const mpeg_header *like = s->started ? &s->head : nullptr;
+    const mpeg_header *reference = s->started ? &s->head : nullptr;
     const int32_t links = s->started ? kResyncChain : kFirstChain;
     mpeg_header h = {};
     int64_t at = 0;
     for (int32_t i = 0; i < links; ++i) {
         if (at == to_end) return i > 0;
         if (at + kMpegHeaderBytes > std::min<int64_t>(got, to_end) || !mpeg_parse(p + at, &h) ||
-            (like != nullptr && !mpeg_same_stream(&h, like))) {
+            (reference != nullptr && !mpeg_same_stream(&h, reference))) {
             return false;
         }
         if (i == 0) *first = h;
-        if (like == nullptr) like = first;
+        if (reference == nullptr) reference = first;
         at += h.bytes;
     }
     return true;
 }
 
-// Moves s->at to the next offset where the stream starts or continues. Skips whole ID3v2 tags.
-// False at the end.
+// Moves s->at to the next offset where the stream starts or continues, skipping complete ID3v2
+// tags. False at the end.
 bool find_chain(mpeg_scan *s, mpeg_header *first) {
     while (s->at < s->end) {
         int32_t got = 0;
@@ -108,8 +108,8 @@ bool find_start(mpeg_scan *s) {
     return find_chain(s, &s->head);
 }
 
-// Adds the frames from s->at to the end, except one that the end of the file cuts. False on a read
-// error, when out of memory, and when there is no frame.
+// Adds the frames from s->at to the end, except an incomplete last one. False on a read error, if
+// memory runs out or if no frame was found.
 bool walk(mpeg_scan *s, frame_index *frames) {
     mpeg_header h = {};
     while (s->end - s->at >= kMpegHeaderBytes) {

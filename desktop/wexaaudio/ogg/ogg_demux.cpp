@@ -1,10 +1,10 @@
-// Ogg: the first audio stream of the file's first group of streams, Vorbis only. A demuxer has that
-// one stream, and the stream handle is the demuxer itself.
+// Ogg: the first audio stream of the file's first group of streams, which must be Vorbis. A demuxer
+// has only this stream, and the stream handle is the demuxer itself.
 //
 // In: mtsrc_io. Out: PCM, the set-up data, the information records.
 //
-// A stream's pages are scattered and its packets continue across them, so packets are identified by
-// their logical offset: the bytes of the stream's page bodies before them.
+// A stream's pages are scattered in the file, and packets continue across pages. Therefore a packet
+// is identified by its logical offset: the number of bytes in the stream's page bodies before it.
 #include <ogg/ogg.h>
 
 #include <algorithm>
@@ -21,7 +21,7 @@ namespace {
 constexpr int32_t kReadBytes = 65536;
 constexpr int32_t kVorbis = 323;  // codec code
 
-// How the first packets of the audio codecs begin; Vorbis first.
+// First bytes of the audio codecs' first packets. Vorbis must be the first entry.
 constexpr std::string_view kAudio[] = {"\x01vorbis", "OpusHead", "\177FLAC", "fLaC", "Speex   "};
 
 constexpr int32_t kVorbisHeaders = 3;           // packets: identification, comments, set-up
@@ -33,7 +33,8 @@ constexpr int32_t kMaxCodebooks = 1 << 20;      // bytes; usual ones have 3 to 1
 constexpr int64_t kMaxGranule = INT64_MAX / 2;  // larger ones count as this: sums stay exact
 constexpr int32_t kMaxPacket32 = 1 << 26;       // bytes; comments may hold pictures
 
-// Replace the file's own comments, which no decoder needs and which may hold a picture.
+// An empty comment packet. It replaces the file's comments, which no decoder needs and which may
+// contain a picture.
 constexpr uint8_t kNoComments[] = {3, 'v', 'o', 'r', 'b', 'i', 's', 0, 0, 0, 0, 0, 0, 0, 0, 1};
 constexpr int32_t kPackHead = 3;  // the mark and the lengths of the first two packets, below 255
 
@@ -44,29 +45,29 @@ struct ogg_scan {
     ogg_sync_state sync;    // finds pages
     int64_t read_at;        // offset in the file of the next byte to be read
     int64_t parse_at;       // and of the next one to be parsed
-    vorbis_parser *parser;  // owned; once the headers are complete
+    vorbis_parser *parser;  // owned; null until the headers are complete
     int64_t header_at[kVorbisHeaders];
     int32_t header_bytes[kVorbisHeaders];
-    int32_t headers;       // found so far
-    long next_page;        // number of the page after the last
+    int32_t headers;       // header packets found so far
+    long next_page;        // number of the page after the last one
     bool gap;              // pages are missing since the last granule position
-    bool open;             // a packet has begun
-    int64_t packet_at;     // logical offset of it
-    int32_t packet_bytes;  // of it so far
+    bool open;             // a packet has begun and not ended
+    int64_t packet_at;     // its logical offset
+    int32_t packet_bytes;  // its bytes so far
     uint8_t packet_first;  // its first byte
     bool has_base;
-    int64_t base;      // granule position at sample 0; known once has_base
-    int64_t page_end;  // end of the audio at the second-last page with a granule position
-    int64_t last_end;  // end by the last granule position, sample frames
+    int64_t base;      // granule position of sample 0; valid if has_base
+    int64_t page_end;  // end of the audio at the second-to-last page with a granule position
+    int64_t last_end;  // end of the audio by the last granule position, sample frames
 };
 
-// Copies the first bytes of a header packet, its name at least. False when it is not Vorbis's.
+// Copies the first bytes of a header packet, at least its name. False if it is not a Vorbis header.
 bool read_header(const ogg_scan *scan, int32_t number, uint8_t *packet, int32_t bytes) {
     return stream_copy(scan->file, scan->info, scan->header_at[number], packet, bytes) == bytes &&
            packet[0] == 2 * number + 1 && memcmp(packet + 1, "vorbis", kNameBytes - 1) == 0;
 }
 
-// Packs the identification and set-up packets into p. False when they are not Vorbis headers.
+// Packs the identification and set-up packets into p. False if they are not Vorbis headers.
 bool pack(const ogg_scan *scan, uint8_t *p) {
     p[0] = kVorbisSetupMark;
     p[1] = kIdBytes;
@@ -85,7 +86,7 @@ bool pack(const ogg_scan *scan, uint8_t *p) {
     return scan->info->rate > 0 && scan->info->channels > 0;
 }
 
-// Prepares the stream once its three header packets are complete.
+// Prepares the stream when its three header packets are complete.
 bool read_headers(ogg_scan *scan) {
     const int32_t books = scan->header_bytes[2];
     uint8_t name[kNameBytes];
@@ -101,7 +102,7 @@ bool read_headers(ogg_scan *scan) {
     return scan->parser != nullptr;
 }
 
-// Adds a packet that is complete.
+// Adds a complete packet.
 bool add_packet(ogg_scan *scan) {
     if (scan->headers < kVorbisHeaders) {
         if (scan->packet_bytes < kNameBytes) return false;
@@ -113,14 +114,14 @@ bool add_packet(ogg_scan *scan) {
     if (scan->packet_bytes == 0) return true;
     const int32_t samples = scan->library->parser_samples(scan->parser, scan->packet_first);
     if (samples <= 0) return true;  // not an audio packet: not decoded
-    // The first packet only primes the decoder for the next.
+    // The first packet has no output; it only prepares the decoder for the next.
     frame_index *packets = &scan->info->frames;
     return frame_index_add(packets, scan->packet_at, scan->packet_bytes,
                            packets->count > 0 ? samples : 0);
 }
 
-// The first granule position states where the stream starts. More audio than it counts is cut off
-// at the start, unless the stream also ends here, when it is cut at the end.
+// The first granule position determines where the stream starts. Audio beyond its count is cut off
+// at the start, or at the end if the stream ends on this page.
 void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     frame_index *packets = &scan->info->frames;
     const int64_t surplus = frame_index_end(packets) - granule;
@@ -141,7 +142,7 @@ void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     }
 }
 
-// Reads the page's lacing values.
+// Reads the page's packets by its lacing values.
 bool read_segments(ogg_scan *scan, const ogg_page *page, int64_t body_first) {
     const int32_t segments = page->header[26];
     const uint8_t *lacing = page->header + 27;
@@ -166,15 +167,16 @@ bool read_segments(ogg_scan *scan, const ogg_page *page, int64_t body_first) {
     return true;
 }
 
-// Adds the next page of the stream; body_at is its body's offset in the file. False when out of
-// memory or when the stream is not Vorbis.
+// Adds the next page of the stream. body_at: offset of its body in the file. False if memory runs
+// out or the stream is not Vorbis.
 bool add_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
     frame_index *pages = &scan->info->pages;
     const frame_index *packets = &scan->info->frames;
     const int64_t body_first = frame_index_end(pages);
     const auto body_bytes = static_cast<int32_t>(page->body_len);
     if (body_bytes > 0 && !frame_index_add(pages, body_at, body_bytes, body_bytes)) return false;
-    // A packet continues only in the next page, and only if that page states it; else it is lost.
+    // A packet continues only on the next page, and only if that page says so. Otherwise it is
+    // lost.
     const long number = ogg_page_pageno(page);
     const bool missing = number != scan->next_page;
     if (missing || ogg_page_continued(page) == 0) scan->open = false;
@@ -187,18 +189,18 @@ bool add_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
     if (!scan->has_base) {
         apply_first_granule(scan, granule, ogg_page_eos(page) != 0);
     } else if (scan->gap) {
-        scan->base = granule - frame_index_end(packets);  // lost time is not filled
+        scan->base = granule - frame_index_end(packets);  // lost time is not filled with silence
     }
     scan->gap = false;
     scan->last_end = granule - scan->base;
     return true;
 }
 
-// Cuts the last packets to the final granule position. False when the stream has no audio.
+// Cuts the last packets at the final granule position. False if the stream has no audio.
 bool cut_end(ogg_scan *scan) {
     frame_index *packets = &scan->info->frames;
     if (!scan->has_base) return packets->count > 0;
-    // Never before the end of the page before the last: a smaller position is damage.
+    // The end is never before that of the second-to-last page; a smaller position is damage.
     const int64_t end = std::max(scan->last_end, scan->page_end);
     for (int64_t i = packets->count - 1; i >= 0 && frame_index_end(packets) > end; --i) {
         frame_entry &entry = packets->entry[i];
@@ -209,8 +211,8 @@ bool cut_end(ogg_scan *scan) {
     return packets->count > 0;
 }
 
-// Reads the next whole page with a correct check sum; *offset receives where it starts. False at
-// the end and on failure.
+// Reads the next complete page with a correct check sum. *offset receives its start. False at the
+// end and on failure.
 bool next_page(ogg_scan *scan, ogg_page *page, int64_t *offset) {
     io_file *file = scan->file;
     for (;;) {
@@ -229,7 +231,7 @@ bool next_page(ogg_scan *scan, ogg_page *page, int64_t *offset) {
     }
 }
 
-// Adds a stream by its first page; the first audio stream is the one that is read.
+// Adds a stream by its first page. The first audio stream is the one to read.
 void add_stream(stream_info *info, const ogg_page *page) {
     if (info->track_count >= kOggStreams) return;
     const int32_t i = info->track_count++;
@@ -244,8 +246,8 @@ void add_stream(stream_info *info, const ogg_page *page) {
     }
 }
 
-// Reads the pages of the first group of streams; a second one may be chained to it. False when the
-// audio stream is not Vorbis after all.
+// Reads the pages of the first group of streams; another group may follow it. False if the audio
+// stream turns out not to be Vorbis.
 bool read_pages(ogg_scan *scan) {
     stream_info *info = scan->info;
     ogg_page page;
@@ -259,7 +261,7 @@ bool read_pages(ogg_scan *scan) {
         const bool was_known = info->track >= 0;
         if (head) add_stream(info, &page);
         if (!was_known) serial = ogg_page_serialno(&page);
-        if (!in_heads && info->codec == nullptr) return true;  // nothing more to find
+        if (!in_heads && info->codec == nullptr) return true;  // no supported audio stream
         if (info->codec != nullptr && serial == ogg_page_serialno(&page) &&
             !add_page(scan, &page, offset + page.header_len)) {
             return false;
@@ -276,7 +278,7 @@ bool scan_file(io_file *file, stream_info *info) {
     scan.info = info;
     info->track = -1;
     info->out_channels = 1;
-    info->preroll = 1;  // what a packet overlaps with
+    info->preroll = 1;  // a packet overlaps the one before
     const bool is_vorbis = read_pages(&scan) && info->codec != nullptr && cut_end(&scan);
     if (!is_vorbis) info->codec = nullptr;
     scan.library->parser_close(scan.parser);

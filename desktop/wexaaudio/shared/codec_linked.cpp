@@ -1,4 +1,4 @@
-// Replaces codec_loaded.cpp where everything is linked into one program.
+// Replaces codec_loaded.cpp in programs that link everything statically.
 #include "desktop/wexaaudio/shared/codec_library.h"
 
 const codec_library *codec_library_get(void) {

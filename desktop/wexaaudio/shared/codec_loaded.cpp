@@ -1,5 +1,5 @@
-// The table from libwexaaudio_av.so, which is in the folder of the library that this file is part
-// of. It stays loaded until the process ends.
+// Loads the table from libwexaaudio_av.so, in the folder of the library that contains this code. It
+// stays loaded until the process ends.
 #include <android/log.h>
 #include <dlfcn.h>
 
@@ -14,10 +14,11 @@ namespace {
 constexpr char kName[] = "libwexaaudio_av.so";
 
 std::mutex lock;
-const codec_library *loaded;  // under lock
+const codec_library *loaded;  // guarded by lock
 
 const codec_library *load() {
-    // By its full path: the sanitizers' dlopen does not know this library's own search path.
+    // Loads it by its full path, because the sanitizers' dlopen ignores this library's own search
+    // path.
     Dl_info self = {};
     char path[4096];
     if (dladdr(&lock, &self) == 0) return nullptr;

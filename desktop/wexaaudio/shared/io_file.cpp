@@ -6,7 +6,7 @@
 
 namespace {
 
-// Reads up to count bytes at offset into buf through the callbacks. Returns the bytes read, -1 on
+// Reads up to count bytes at offset into buf through the callbacks. Returns the bytes read; -1 on
 // failure.
 int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
     if (f->at != offset) {
@@ -15,9 +15,9 @@ int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
     }
     int64_t done = 0;
     while (done < count) {
-        const int64_t piece = std::min<int64_t>(count - done, 1 << 30);
-        const int64_t got = f->io.read(f->file, buf + done, static_cast<int32_t>(piece));
-        if (got < 0 || got > piece) {
+        const int64_t part = std::min<int64_t>(count - done, 1 << 30);
+        const int64_t got = f->io.read(f->file, buf + done, static_cast<int32_t>(part));
+        if (got < 0 || got > part) {
             f->at = -1;
             return -1;
         }
@@ -28,12 +28,12 @@ int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
     return done;
 }
 
-// Makes the block start at offset. Bytes that it holds already are not read again.
+// Makes the block start at offset. Keeps the bytes that it already has.
 bool fill_block(io_file *f, int64_t offset) {
-    const int64_t held_end = f->block_at + f->block_got;
+    const int64_t block_end = f->block_at + f->block_got;
     int32_t keep = 0;
-    if (offset >= f->block_at && offset < held_end) {
-        keep = static_cast<int32_t>(held_end - offset);
+    if (offset >= f->block_at && offset < block_end) {
+        keep = static_cast<int32_t>(block_end - offset);
         memmove(f->block, f->block + (offset - f->block_at), static_cast<size_t>(keep));
     }
     f->block_at = offset;
@@ -69,8 +69,8 @@ const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *g
     *got = 0;
     if (offset < 0 || offset >= f->size || want > kMaxLook) return nullptr;
     const int64_t want_end = std::min(offset + std::max(want, 1), f->size);
-    const bool held = offset >= f->block_at && want_end <= f->block_at + f->block_got;
-    if (!held && !fill_block(f, offset)) return nullptr;
+    const bool buffered = offset >= f->block_at && want_end <= f->block_at + f->block_got;
+    if (!buffered && !fill_block(f, offset)) return nullptr;
     *got = static_cast<int32_t>(f->block_at + f->block_got - offset);
     return *got > 0 ? f->block + (offset - f->block_at) : nullptr;
 }
@@ -88,10 +88,10 @@ int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count) {
         f->failed = f->failed || got < 0;
         return got;
     }
-    int32_t held = 0;
-    const uint8_t *at = io_file_peek(f, offset, static_cast<int32_t>(count), &held);
+    int32_t available = 0;
+    const uint8_t *at = io_file_peek(f, offset, static_cast<int32_t>(count), &available);
     if (at == nullptr) return f->failed ? -1 : 0;
-    const int64_t copied = std::min<int64_t>(count, held);
+    const int64_t copied = std::min<int64_t>(count, available);
     memcpy(buf, at, static_cast<size_t>(copied));
     return copied;
 }

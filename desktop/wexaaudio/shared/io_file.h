@@ -1,4 +1,4 @@
-// File access of every reader: a handle of its own, opened through the source's callbacks, read at
+// File access of every reader: its own handle, opened through the source's callbacks and read at
 // any offset through one buffer. Offsets and sizes are 64-bit.
 //
 // In: mtsrc_io. Out: bytes at an offset. Used by one thread at a time.
@@ -7,36 +7,37 @@
 
 #include "media_source/mtsrc_io.h"
 
-constexpr int32_t kIoBlock = 65536;         // bytes read ahead
-constexpr int32_t kMaxLook = kIoBlock / 2;  // bytes that a look-ahead may ask for
+constexpr int32_t kIoBlock = 65536;  // bytes read ahead
+constexpr int32_t kMaxLook =
+    kIoBlock / 2;  // largest number of bytes that io_file_peek can guarantee
 
 struct io_file {
-    mtsrc_io io;        // copy: the callbacks stay callable while the reader is deleted
+    mtsrc_io io;        // a copy, so that the callbacks can be called while the reader is deleted
     mtsrc_file *file;   // owned
     int64_t size;       // bytes, when the file was opened
-    int64_t at;         // offset of the handle, -1 unknown
+    int64_t at;         // offset of the handle, or -1 if unknown
     uint8_t *block;     // [kIoBlock] owned
     int64_t block_at;   // offset of block[0]
-    int32_t block_got;  // bytes held
+    int32_t block_got;  // bytes in the block
     bool failed;        // a read or seek has failed
 };
 
-// Opens io's file read-only. False on failure, with nothing held. *f may be uninitialised.
+// Opens io's file read-only. False on failure, with nothing to release. *f may be uninitialised.
 bool io_file_open(io_file *f, const mtsrc_io *io);
 
-// Releases what *f holds; harmless on a zeroed or closed record.
+// Releases what *f owns. Does nothing for a zeroed or closed record.
 void io_file_close(io_file *f);
 
-// Copies up to count bytes at offset. Returns the bytes copied, fewer only at the end of the file,
-// 0 past it, -1 on a read error. Large copies bypass the buffer.
+// Copies up to count bytes at offset. Returns the bytes copied, fewer only at the end of the file;
+// 0 past the end; -1 on a read error. Large copies bypass the buffer.
 int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count);
 
-// The buffered bytes at offset: *got receives their count, at least min(want, bytes to the
-// end of the file), often more. want <= kMaxLook. Returns null at the end of the file, before its
-// start and on a read error (then failed is set); the pointer is valid until the next call.
+// Returns the buffered bytes at offset, valid until the next call. *got receives their count: at
+// least min(want, bytes to the end of the file), often more. want <= kMaxLook. Returns null outside
+// the file and on a read error, which sets failed.
 const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *got);
 
-// The same for exactly count bytes; null when the file has fewer there.
+// Returns exactly count bytes at offset, as io_file_peek does. Null if the file has fewer.
 const uint8_t *io_file_bytes(io_file *f, int64_t offset, int32_t count);
 
 #endif

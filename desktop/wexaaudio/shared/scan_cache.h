@@ -1,9 +1,10 @@
-// Results of scanning files, shared by the readers of a file: a job opens one file five times.
+// Results of scanning files, shared by the readers of a file, because a job opens each file five
+// times.
 //
-// A file is identified by its path's device, inode, size and time of change, so that a file that
-// was replaced or written to is scanned again. The result used last is kept for the next reader,
-// unless the file changed so shortly before that a further change could go unnoticed. Readers whose
-// callbacks serve other paths, or none, share nothing.
+// A file is identified by its path's device, inode, size and time of change, so a file that was
+// replaced or written to is scanned again. The result used last stays for the next reader, unless
+// the file changed so recently that another change could go unnoticed. Readers whose callbacks use
+// another kind of path, or none, share nothing.
 #ifndef WEXAAUDIO_SCAN_CACHE_H
 #define WEXAAUDIO_SCAN_CACHE_H
 
@@ -12,48 +13,49 @@
 
 constexpr int32_t kMaxTracks = 64;
 
-// What a scan finds in a file. Not changed afterwards: readers of the same file share it.
+// Result of a scan. It does not change afterwards, because readers of the same file share it.
 struct stream_info {
     frame_index frames;  // owned
     frame_index pages;  // owned; Ogg: offset is a page body's offset in the file, first its logical
                         // offset, samples its bytes. Frames then have logical offsets
-    const char *codec;  // libavcodec's name; null when there is no stream that can be decoded
-    uint8_t *setup;     // owned; set-up data of the decoder, may be null
+    const char *codec;  // libavcodec's name; null if no stream can be decoded
+    uint8_t *setup;     // owned; set-up data of the decoder, or null
     int32_t setup_bytes;
-    int32_t rate;          // Hz, of the output
+    int32_t rate;          // of the output, Hz
     int32_t channels;      // of the stream
     int32_t out_channels;  // of the output, 1 or 2
     int64_t delay;         // sample frames that the source drops at the start: seeks and the
                            // duration count without them
 
-    // What a decoder must have decoded before frame n: from the start of n's group of this many
-    // frames (0: there are no groups) as many frames more, and those with as many bytes of payload
-    // before these. Each group starts a fresh decoder.
-    int32_t group;
+    // Frames that a fresh decoder decodes first. To deliver frame n, it starts from the first frame
+    // of n's group, or from n if there are no groups. Before that frame it decodes `preroll`
+    // frames, and before those as many as contain `reservoir` bytes of payload. Each group has its
+    // own decoder.
+    int32_t group;  // frames, or 0 if there are no groups
     int32_t preroll;
-    int32_t reservoir;  // bytes
-    int32_t overhead;   // bytes of a frame before its payload
+    int32_t reservoir;
+    int32_t overhead;  // bytes of a frame before its payload
 
-    int64_t cut_frame;    // the frame whose output loses cut_samples at its front
-    int32_t cut_samples;  // 0: none does
+    int64_t cut_frame;    // the frame whose output is shortened by cut_samples at its start
+    int32_t cut_samples;  // sample frames, or 0
 
-    // In a container.
+    // For containers.
     int32_t track_count;
     int32_t kind[kMaxTracks];  // kWexaKindAudio for audio
-    int32_t track;             // the one that is read; -1 without one
+    int32_t track;             // index of the track to read, or -1
 
-    // FLAC, which needs no index.
+    // For FLAC, which needs no index.
     int64_t base;  // number of the stream's first sample
     int64_t end;   // sample frames
 };
 
-// One format's scan, which identifies the format. Fills in a zeroed result. False when the file is
-// not of the format or cannot be read, and when out of memory; what the result owns by then is
-// released by the caller.
+// Scans a file for one format and fills in a zeroed result. False if the file is not of the format,
+// if it cannot be read or if memory runs out. The caller releases what the result owns, also after
+// a failure.
 typedef bool (*scan_function)(io_file *file, stream_info *info);
 
-// The result for an open file: another reader's, or of a new scan. Null when the scan fails.
-// Returned with scan_cache_put. Any thread.
+// The result for an open file, from another reader or from a new scan. Null if the scan fails. The
+// caller returns it with scan_cache_put. May be called on any thread.
 const stream_info *scan_cache_get(io_file *file, scan_function scan);
 
 void scan_cache_put(const stream_info *info);  // null is allowed

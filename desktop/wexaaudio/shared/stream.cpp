@@ -9,9 +9,9 @@
 
 namespace {
 
-constexpr int32_t kFailed = -3;  // a read error; kCodecNoMemory ends a read as well
+constexpr int32_t kFailed = -3;  // a read error
 
-// The first frame to decode so that frame n is bit-identical to a linear read.
+// Index of the first frame to decode so that frame n is bit-identical to a linear read.
 int64_t first_needed(const stream_info *info, int64_t n) {
     if (info->group > 0) n -= n % info->group;
     n = std::max<int64_t>(n - info->preroll, 0);
@@ -22,8 +22,8 @@ int64_t first_needed(const stream_info *info, int64_t n) {
     return n;
 }
 
-// Returns the sample frames held, 0 when the frame cannot be decoded, else the reason why reading
-// ends.
+// Returns the sample frames of the output; 0 if the frame cannot be decoded; kFailed or
+// kCodecNoMemory, which end the read.
 int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     if (entry.bytes <= 0 || entry.bytes > kMaxPacket) return 0;
     uint8_t *packet = r->library->packet(r->decoder, entry.bytes);
@@ -35,7 +35,7 @@ int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     return held == -1 ? 0 : held;
 }
 
-// Decodes frame next, after the frames that it needs.
+// Decodes frame next and, with a fresh decoder, the frames that it depends on.
 int32_t decode_next(stream_reader *r) {
     const stream_info *info = r->info;
     int64_t n = r->next;
@@ -68,13 +68,13 @@ void stream_close(void *reader) {
     free(r);
 }
 
-// A container's stream is the container itself.
+// The stream of a container is the reader of the container itself.
 void *stream_of_track(void *reader, int32_t track, void * /*reserved*/) {
     const auto *r = static_cast<stream_reader *>(reader);
     return track >= 0 && track == r->info->track ? reader : nullptr;
 }
 
-// Reads the next frame that has samples: a frame that cannot be decoded becomes silence.
+// Reads the next frame that has samples. A frame that cannot be decoded becomes silence.
 int32_t stream_read(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                     int64_t *second) {
     auto *r = static_cast<stream_reader *>(reader);
@@ -110,8 +110,8 @@ int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached) {
     if (info->codec == nullptr) return -1;
     const int64_t end = delivered(info);
     const int64_t sample = seek_target(*position, end, info->rate);
-    // The source drops samples at time 0. At any other position, in the first frame too, the
-    // frame's time is not 0, so that nothing is dropped twice.
+    // The source drops samples at time 0. At every other position, even in the first frame, the
+    // time is not 0, so that nothing is dropped twice.
     const int64_t decoded = sample > 0 ? sample + info->delay : 0;
     const frame_index *frames = &info->frames;
     r->next = sample < end ? frame_index_find(frames, decoded) : frames->count;
@@ -127,7 +127,7 @@ int32_t stream_seek_in_container(void *stream, const int64_t *position, int64_t 
     return stream_seek(stream, position, reached);
 }
 
-// These functions of the interface differ in their names only.
+// These functions of the interface differ only in their names.
 decltype(stream_read) xaacfd_get_frm [[gnu::alias("stream_read")]];
 decltype(stream_read) xmp123fd_get_frm [[gnu::alias("stream_read")]];
 decltype(stream_read) xmp4fds_get_frm [[gnu::alias("stream_read")]];

@@ -9,7 +9,8 @@ int64_t units_from_samples(int64_t sample, int32_t rate) {
 int64_t seek_target(int64_t units, int64_t end, int32_t rate) {
     if (units <= 0) return 0;
     if (units >= units_from_samples(end, rate)) return end;
-    // Times are rounded up, so the target is the first sample that begins after the previous unit.
+    // Times of samples are rounded up to units, so the sample is the first one that begins after
+    // the previous unit.
     const int64_t before = units - 1;
     return before / kUnits * rate + before % kUnits * rate / kUnits + 1;
 }

@@ -1,6 +1,7 @@
-// RIFF WAVE with 16-bit linear PCM: chunks in any order, wrong sizes, files beyond 4 GiB.
+// RIFF WAVE with 16-bit linear PCM. Accepts chunks in any order, wrong sizes, and files larger than
+// 4 GiB.
 //
-// In: mtsrc_io. Out: whole sample frames of interleaved PCM, the information record.
+// In: mtsrc_io. Out: complete sample frames of interleaved PCM, the information record.
 #include <algorithm>
 #include <climits>
 #include <cstdlib>
@@ -14,8 +15,8 @@ namespace {
 
 constexpr int32_t kRiffHead = 12;         // bytes: "RIFF", size, "WAVE"
 constexpr int32_t kChunkHead = 8;         // bytes: name, size
-constexpr int32_t kFormatBytes = 16;      // least size of a "fmt " chunk
-constexpr int32_t kExtensibleBytes = 40;  // of an extensible one
+constexpr int32_t kFormatBytes = 16;      // smallest size of a "fmt " chunk
+constexpr int32_t kExtensibleBytes = 40;  // smallest size of an extensible one
 constexpr uint32_t kUnknownSize = 0xFFFFFFFF;
 constexpr int32_t kMaxChunks = 65536;  // real files have far fewer
 constexpr int32_t kTagPcm = 1;
@@ -32,13 +33,13 @@ struct wav_reader {
     bool has_data;
     int32_t tag;
     int32_t channels;
-    int32_t rate;  // Hz; below 0 when the file states 2^31 or more
+    int32_t rate;  // Hz; negative if the file states 2^31 or more
     int32_t bits;
     int64_t data;        // offset of the first sample frame
-    int64_t data_bytes;  // as present in the file
+    int64_t data_bytes;  // present in the file
     int32_t block;       // bytes of a sample frame
     int64_t total;       // sample frames
-    int64_t next;        // sample frame read next
+    int64_t next;        // sample frame to read next
 };
 
 uint32_t le16(const uint8_t *p) {
@@ -61,8 +62,8 @@ void read_format(wav_reader *r, const uint8_t *p, int64_t bytes) {
     }
 }
 
-// A data size of 0 or of all ones was never filled in by its writer, and a file may be cut short:
-// then the rest of the file is the data.
+// A writer that did not finish leaves a data size of 0 or of all ones, and a file may be truncated.
+// In these cases the data is the rest of the file.
 void read_data(wav_reader *r, int64_t offset, uint32_t size) {
     const int64_t rest = r->file.size - offset;
     r->has_data = true;
@@ -71,7 +72,7 @@ void read_data(wav_reader *r, int64_t offset, uint32_t size) {
     if (size != 0 && size != kUnknownSize) r->data_bytes = std::min<int64_t>(rest, size);
 }
 
-// Walks the chunks until both the format and the data are known. False on a read error or when the
+// Walks the chunks until both the format and the data are known. False on a read error or if the
 // file is not RIFF WAVE.
 bool read_chunks(wav_reader *r) {
     io_file *f = &r->file;
@@ -99,8 +100,8 @@ bool read_chunks(wav_reader *r) {
     return true;
 }
 
-// Fills in the record, which also explains a refusal. False when the header is too damaged: the
-// record stays empty.
+// Fills the record, which also explains a refusal. If the header is too damaged, returns false and
+// leaves the record empty.
 bool fill_info(xwav_info *info, const wav_reader *r) {
     if (!r->has_format || r->channels == 0 || r->rate <= 0) return false;
     info->codec = r->tag == kTagPcm    ? kWexaPcm
