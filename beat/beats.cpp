@@ -17,7 +17,7 @@ outcome check_stop(const TAVO_CTX *ctx) {
     return load_flag(&ctx->quit) != 0 ? stopped : going_on;
 }
 
-// Arguments and result of the search for power rises, which runs side the onset envelope.
+// Arguments and result of the search for power rises, which runs in parallel to the onset envelope.
 struct rise_search {
     const TAVO_CTX *ctx;
     int32_t count;     // or TAVO_ERR_MEMORY

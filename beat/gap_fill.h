@@ -20,9 +20,9 @@ int32_t bringMoreBeat(int32_t a, int32_t b, int32_t *dst, const int32_t *peaks, 
                       int32_t maxn, const double *env);
 }
 
-// Adds up to five peaks to each gap between the count ascending beats (seconds) in out that is
-// longer than three spans or at least six seconds. Appends them to out. peaks: ascending. Returns
-// how many it added.
+// Fills the gaps between the beats out[count] (seconds, ascending) that are longer than three spans
+// or at least six seconds. Appends up to five peaks per gap to out. peaks: ascending. Returns how
+// many it added.
 int32_t fill_gaps(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, float span, float *out,
                   int32_t count);
 

@@ -37,7 +37,7 @@ struct TAVO_FMT {
 
 // Highlight: modes 0 and 2.
 struct TAVO_HL_CTX {
-    int32_t hl_param;     // highlight length requested, seconds; 0 or less for any
+    int32_t hl_param;     // highlight length requested, seconds; 0 or less for none
     float *power;         // [power_count] one loudness value per 2 s, owned
     int32_t power_count;  // values in power
     uint32_t hl_pos;      // highlight start, milliseconds

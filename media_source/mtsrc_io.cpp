@@ -71,9 +71,9 @@ int64_t mtsrc_file_write(mtsrc_file *file, const void *buf, int32_t count) {
 
 int32_t mtsrc_file_tell(mtsrc_file *file, int64_t *offset) {
     if (!is_usable(file) || offset == nullptr) return kFailed;
-    const int64_t now = lseek64(file->fd, 0, SEEK_CUR);
-    if (now < 0) return kFailed;
-    *offset = now;
+    const int64_t current = lseek64(file->fd, 0, SEEK_CUR);
+    if (current < 0) return kFailed;
+    *offset = current;
     return 0;
 }
 
@@ -88,10 +88,10 @@ int32_t mtsrc_file_skip(mtsrc_file *file, const int64_t *distance) {
 }
 
 int32_t mtsrc_file_size(mtsrc_file *file, int64_t *length) {
-    int64_t now = 0;
-    if (length == nullptr || mtsrc_file_tell(file, &now) != 0) return kFailed;
+    int64_t current = 0;
+    if (length == nullptr || mtsrc_file_tell(file, &current) != 0) return kFailed;
     const int64_t end = lseek64(file->fd, 0, SEEK_END);
-    if (mtsrc_file_seek(file, &now) != 0 || end < 0) return kFailed;
+    if (mtsrc_file_seek(file, &current) != 0 || end < 0) return kFailed;
     *length = end;
     return 0;
 }

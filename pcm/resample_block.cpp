@@ -104,8 +104,8 @@ void average_part(void *record) {
     average_blocks(part->ratio, part->in, 0, part->in_count, part->out, exact, part->end);
 }
 
-// Computes the outputs from exact_blocks(4) to n at ratio 4 in place. A block may begin before the
-// place of its output, so it is read ahead.
+// Computes the outputs from exact_blocks(4) to n at ratio 4 in place. The samples of a block may be
+// overwritten by an earlier output, so they are read ahead.
 void average_rounded_in_place(const int16_t *in, int64_t count, double *out, int64_t n) {
     // Outputs per step. The position of a step's first output is exact in songs of up to 72 days,
     // so a block extends at most one sample into the next step.
