@@ -65,7 +65,7 @@
 extern "C" {
 #endif
 
-/** What an instance finds. */
+/** Analysis modes. */
 enum {
     TAVO_MODE_HIGHLIGHT = 0, /**< the start of the highlight */
     TAVO_MODE_BEATS = 1,     /**< the beats and the tempo of the whole file */
@@ -136,7 +136,6 @@ typedef void (*TAVO_LISTENER)(TAVO_INFO *info, void *user);
 /** Opens a file, reads its format and closes it, to find out whether tavo_init can use it. Needs no
  * instance. If the result is 0, -8 or -9, *stream receives the stream; otherwise it is zeroed.
  * stream may be null.
- *
  *
  * Returns 0 if the file can be used, or the reason why it cannot:
  * - -2: out of memory;

@@ -25,9 +25,9 @@ inline int64_t second_bytes(int32_t rate) {
     return rate * kBytesPerSample;
 }
 
-// Copies the count decoded segments to dst (capacity bytes). Each goes to where the output already
-// holds the same bytes, or to the end of the output. Returns the bytes written; 0 if any segment is
-// empty.
+// Copies the count decoded segments to dst (capacity bytes). Each is placed where the output
+// already has the same bytes, or at the end of the output. Returns the bytes written; 0 if any
+// segment is empty.
 int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
                         int64_t capacity, segment_pages pages);
 

@@ -36,8 +36,8 @@ bool header_at(io_file *file, int64_t offset, adts_header *h) {
     return h->bytes >= h->head && aac_rate_of_index(h->rate_index) > 0 && (p[6] & 3) == 0;
 }
 
-// True if both frames may belong to one stream. Channels may change within a stream, as in a
-// broadcast; the decoder follows.
+// True if both frames may belong to one stream. The number of channels may change within a stream,
+// as in a broadcast; the decoder adapts.
 bool same_stream(const adts_header &a, const adts_header &b) {
     return a.object_type == b.object_type && a.rate_index == b.rate_index;
 }

@@ -12,9 +12,9 @@ constexpr int32_t kMaxBoxes = 65536;    // in one level; real files have far few
 constexpr int64_t kFullHead = 4;        // bytes: version and flags, if a box has them
 constexpr int64_t kMaxTable = 1 << 26;  // bytes; a day of audio needs less
 
-// Bytes of the file per frame, at least; more frames are not believed. The shortest AAC frame of
-// silence has 4 bytes, plus 4 in the tables. Frames that share their bytes would take memory
-// without limit.
+// Minimum plausible number of bytes of the file per frame. The shortest AAC frame of silence has 4
+// bytes, plus 4 in the tables. Without this limit, frames that share their bytes would take
+// unlimited memory.
 constexpr int64_t kMinFrameBytes = 2;
 
 constexpr uint32_t name_of(const char (&text)[5]) {

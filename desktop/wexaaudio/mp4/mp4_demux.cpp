@@ -12,8 +12,8 @@
 
 namespace {
 
-// Frames searched for a header that states rate and length. Unless it is damaged, the first one has
-// it.
+// Number of frames searched for a header that states rate and length. Normally the first frame has
+// one.
 constexpr int64_t kTriedFrames = 64;
 
 // Reads rate, channels and frame length of a Layer III track from its frames, which all have the
