@@ -19,24 +19,17 @@ void open_standard_streams() {
     }
 }
 
-int run(int argc, char **argv) {
-    open_standard_streams();
-    options opts;
-    if (const std::optional<int> status = parse_options(argc, argv, opts)) return *status;
-    if (!watch_for_stop()) {
-        perror("tavo");
-        return kExitFailed;
-    }
-    return analyse_inputs(opts);
-}
-
 }  // namespace
 
 int main(int argc, char **argv) {
     try {
-        return run(argc, argv);
+        open_standard_streams();
+        options opts;
+        if (const std::optional<int> status = parse_options(argc, argv, opts)) return *status;
+        if (watch_for_stop()) return analyse_inputs(opts);
+        perror("tavo");
     } catch (const std::exception &error) {  // out of memory
         fprintf(stderr, "tavo: %s\n", error.what());
-        return kExitFailed;
     }
+    return kExitFailed;
 }

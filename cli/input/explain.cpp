@@ -37,14 +37,14 @@ int find_read_error(const std::string &path) {
 
 std::string explain_format(file_kind kind) {
     const std::string name = kind_name(kind);
-    const std::string rates =
-        std::to_string(TAVO_MIN_RATE) + " to " + std::to_string(TAVO_MAX_RATE) + " Hz";
+    const std::string highest = std::to_string(TAVO_MAX_RATE) + " Hz";
+    const std::string rates = std::to_string(TAVO_MIN_RATE) + " to " + highest;
     switch (kind) {
         case file_kind::unknown:
             return "The file is not recognised as audio of a known format.";
         case file_kind::wav:
-            return "The WAV file is damaged or is not 16-bit integer PCM at up to " +
-                   std::to_string(TAVO_MAX_RATE) + " Hz, which is all that is read.";
+            return "The WAV file is damaged or is not 16-bit integer PCM at up to " + highest +
+                   ", which is all that is read.";
         case file_kind::mp4:
             return "The MP4 file's audio is neither AAC nor MP3, or its sample rate is not " +
                    rates + ".";
@@ -68,8 +68,8 @@ std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream
         case TAVO_ERR_FORMAT:
             return explain_format(kind);
         case TAVO_ERR_OPEN:
-            if (kind != file_kind::ogg) return subject + "has no usable audio stream.";
-            return "The Ogg file has no usable audio stream; only Vorbis is read from Ogg.";
+            return subject + "has no usable audio stream" +
+                   (kind == file_kind::ogg ? "; only Vorbis is read from Ogg." : ".");
         case TAVO_ERR_READ:
             return subject + "cannot be read or decoded.";
         case TAVO_ERR_CODEC:

@@ -1,7 +1,7 @@
 // A song as the library can open it: the file itself, what came through a pipe, or what ffmpeg
 // decoded.
 //
-// In: a path of the command line. Out: a path for the library. Called by run/worker.h.
+// In: a path of the command line. Out: a path for the library. Called by run/analyse.h.
 #ifndef TAVO_CLI_INPUT_SONG_FILE_H
 #define TAVO_CLI_INPUT_SONG_FILE_H
 

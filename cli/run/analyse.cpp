@@ -1,14 +1,14 @@
 #include "cli/run/analyse.h"
 
-#include <fcntl.h>
 #include <poll.h>
+#include <sys/eventfd.h>
 #include <sys/resource.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <atomic>
 #include <cerrno>
 #include <cmath>
+#include <iterator>
 
 #include "cli/input/explain.h"
 #include "cli/input/player_offset.h"
@@ -23,26 +23,25 @@ namespace {
 // library refines a highlight after any rise of 3 dB.
 constexpr double kRaisedPower = 0.1585;
 
-// Set by the callback on the thread of the job: the pointer hands over the result, the pipe wakes
-// the waiting thread.
-std::atomic<const TAVO_INFO *> result{nullptr};
-int done_write_fd = -1;
+// The end of a job, set on the job's thread.
+struct job_end {
+    std::atomic<const TAVO_INFO *> result{nullptr};
+    int fd = -1;  // eventfd that wakes the waiting thread
+};
 
-void on_result(TAVO_INFO *info) {
-    result.store(info, std::memory_order_release);
-    const char done = 1;
-    while (write(done_write_fd, &done, 1) < 0 && errno == EINTR) {
-    }
+void on_result(TAVO_INFO *info, void *user) {
+    auto *end = static_cast<job_end *>(user);
+    end->result.store(info, std::memory_order_release);
+    eventfd_write(end->fd, 1);
 }
 
-// Waits for the callback or the stop. Returns true after the callback.
-bool wait_for_result(int done_fd, int stop_fd) {
-    pollfd watched[2] = {{done_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
-    while (true) {
-        if (poll(watched, 2, -1) < 0) continue;  // EINTR
-        if (watched[0].revents != 0) return result.load(std::memory_order_acquire) != nullptr;
-        if (watched[1].revents != 0) return false;
+// Waits for the end of the job or a stop. Returns the job's result; null after a stop.
+const TAVO_INFO *wait_for_result(const job_end &end, int stop_fd) {
+    pollfd watched[] = {{end.fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
+    while (poll(watched, std::size(watched), -1) < 0) {  // EINTR
     }
+    if (watched[0].revents == 0) return nullptr;
+    return end.result.load(std::memory_order_acquire);
 }
 
 void read_stream(const TAVO_CTX *ctx, record &out) {
@@ -92,27 +91,25 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
         tavo_deinit(ctx);
         return;
     }
-    int done_pipe[2];
-    if (pipe2(done_pipe, O_CLOEXEC) != 0) {
+    job_end end;
+    end.fd = eventfd(0, EFD_CLOEXEC);
+    if (end.fd < 0) {
         out.error = system_sentence("The analysis could not be started", errno);
         tavo_deinit(ctx);
         return;
     }
-    done_write_fd = done_pipe[1];
-    result.store(nullptr);
-    tavo_setcallback(ctx, on_result);
+    tavo_set_listener(ctx, on_result, &end);
     const int32_t code = tavo_analyze(ctx, opts.length_s, opts.max_beats, 0);
     if (code != TAVO_OK) {
         out.error = "The analysis could not be started (code " + std::to_string(code) + ").";
-    } else if (wait_for_result(done_pipe[0], stop_fd)) {
-        read_result(ctx, result.load(), out);
+    } else if (const TAVO_INFO *info = wait_for_result(end, stop_fd)) {
+        read_result(ctx, info, out);
     } else {
         out.status = outcome::stopped;
         out.error = "The analysis was stopped.";
     }
     tavo_deinit(ctx);
-    close(done_pipe[0]);
-    close(done_pipe[1]);
+    close_fd(end.fd);
 }
 
 void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out);

@@ -1,6 +1,6 @@
 #include "cli/run/stop.h"
 
-#include <fcntl.h>
+#include <sys/eventfd.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -13,37 +13,36 @@ namespace {
 constexpr int kSignals[] = {SIGINT, SIGTERM, SIGHUP};
 
 volatile sig_atomic_t received = 0;
-int wake_pipe[2] = {-1, -1};
+int wake_fd = -1;  // eventfd
 
 void on_signal(int number) {
     const int saved = errno;
     if (received != 0) _exit(kExitSignal + number);
     received = number;
-    const char byte = 1;
-    const ssize_t written = write(wake_pipe[1], &byte, 1);
-    static_cast<void>(written);  // the pipe is empty: one byte always fits
+    eventfd_write(wake_fd, 1);
     errno = saved;
 }
 
-void set_handler(int number, void (*handler)(int)) {
+// Returns the handler before.
+sighandler_t set_handler(int number, sighandler_t handler) {
     struct sigaction action {};
+    struct sigaction before {};
     action.sa_handler = handler;
     sigemptyset(&action.sa_mask);
-    sigaction(number, &action, nullptr);  // no SA_RESTART: a blocked read must return
-}
-
-bool is_ignored(int number) {
-    struct sigaction action {};
-    return sigaction(number, nullptr, &action) == 0 && action.sa_handler == SIG_IGN;
+    sigaction(number, &action, &before);  // no SA_RESTART: a blocked read must return
+    return before.sa_handler;
 }
 
 }  // namespace
 
 bool watch_for_stop() {
-    if (pipe2(wake_pipe, O_CLOEXEC | O_NONBLOCK) != 0) return false;
-    set_handler(SIGINT, on_signal);
-    set_handler(SIGTERM, on_signal);
-    if (!is_ignored(SIGHUP)) set_handler(SIGHUP, on_signal);  // nohup
+    wake_fd = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
+    if (wake_fd < 0) return false;
+    for (const int number : kSignals) {
+        // A command that nohup starts goes on after a SIGHUP.
+        const bool was_ignored = set_handler(number, on_signal) == SIG_IGN;
+        if (was_ignored && number == SIGHUP) set_handler(number, SIG_IGN);
+    }
     set_handler(SIGPIPE, SIG_IGN);
     set_handler(SIGXFSZ, SIG_IGN);  // writing beyond the size limit returns an error
     return true;
@@ -51,8 +50,7 @@ bool watch_for_stop() {
 
 void ignore_stop_signals() {
     for (const int number : kSignals) set_handler(number, SIG_IGN);
-    close(wake_pipe[0]);
-    close(wake_pipe[1]);
+    close(wake_fd);
 }
 
 bool stop_requested() {
@@ -64,5 +62,5 @@ int stop_signal() {
 }
 
 int stop_fd() {
-    return wake_pipe[0];
+    return wake_fd;
 }
