@@ -8,8 +8,8 @@
 #include <string>
 
 struct [[nodiscard]] failure {
-    std::string sentence;       // what failed and why, for people; empty after success
-    bool is_permanent = false;  // trying again cannot help
+    std::string sentence;       // error message for the user; empty on success
+    bool is_permanent = false;  // a retry cannot succeed
 
     explicit operator bool() const { return !sentence.empty(); }
 };

@@ -11,7 +11,7 @@
 
 namespace {
 
-// Opens /dev/null for reading on each standard stream that is closed, so that no pipe gets its
+// Opens /dev/null for reading for each standard stream that is closed, so that no pipe gets its
 // number. Writing to such a stream still fails.
 void open_standard_streams() {
     for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {

@@ -1,4 +1,4 @@
-// The formats of the page: WAV, in which it hands over what the browser decoded.
+// The formats of the page: only WAV, in which the page passes the decoded sound.
 #include "media_source/format_table.h"
 
 const format_ops *format_ops_of(int32_t type) {

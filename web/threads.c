@@ -1,5 +1,5 @@
-// Threads for a page that has none. The first thread, the job's, runs to its end inside
-// pthread_create; the threads that it would start fail, and their work is done by their starters.
+// pthread functions for a page without threads. The first thread, the job's, runs to its end inside
+// pthread_create. The threads that the job would start fail, so it does their work itself.
 #include <errno.h>
 #include <pthread.h>
 #include <setjmp.h>
@@ -7,7 +7,7 @@
 
 static jmp_buf thread_end;
 static int thread_runs = 0;
-static char handle;  // its address is the handle of every thread that has ended
+static char handle;  // its address is the handle of every ended thread
 
 int pthread_create(pthread_t *thread, const pthread_attr_t *attr, void *(*entry)(void *),
                    void *arg) {

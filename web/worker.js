@@ -1,5 +1,5 @@
 "use strict";
-// One song, or one marker file, for each worker: ending it gives its memory back.
+// Each worker handles one song or one marker file. Ending it frees its memory.
 self.onmessage = async ({ data }) => {
   try {
     const packed = Uint8Array.from(atob(data.wasm), (c) => c.charCodeAt(0));

@@ -57,7 +57,7 @@ std::string explain_format(file_kind kind) {
     }
 }
 
-// The reason for a code of tavo_probe.
+// Returns the reason for a code of tavo_probe.
 std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream) {
     const std::string subject = std::string("The ") + kind_name(kind) + " file ";
     switch (code) {

@@ -1,5 +1,5 @@
-// Why a file cannot be analysed: tavo_init has one code for every reason, so the system and
-// tavo_probe are asked.
+// Explains why a file cannot be analysed. tavo_init has one code for every reason, so the reason
+// comes from the system or from tavo_probe.
 #ifndef TAVO_CLI_INPUT_EXPLAIN_H
 #define TAVO_CLI_INPUT_EXPLAIN_H
 
@@ -13,11 +13,11 @@
 // whatever kind of file it is.
 failure check_file(const std::string &path);
 
-// The reason for a failure of tavo_init with code; path is the one that the library was given.
-// Fills what is known of the stream into result.
+// Returns the reason for a failure of tavo_init with code. path: as passed to the library. Stores
+// what is known of the stream in result.
 failure explain_refusal(const std::string &path, int32_t code, record &result);
 
-// Refuses audio that is longer than the user allows, by the duration that the file states.
+// Refuses a file that states a longer duration than the user allows.
 failure check_duration(int64_t duration_ms, int32_t max_minutes);
 
 #endif

@@ -16,11 +16,11 @@
 namespace {
 
 constexpr size_t kRateOffset = 24;                            // of a WAV header
-constexpr size_t kHeaderBytes = 44;                           // of ffmpeg's, without tags
+constexpr size_t kHeaderBytes = 44;                           // of ffmpeg's header without tags
 constexpr int64_t kMostWavBytes = (int64_t{1} << 32) - 4096;  // a WAV file has 32-bit sizes
 
-// Sound that a file may decode to: a minute, and so many samples for each of its bytes. Silence has
-// about a thousand in the most compact codecs; a time stamp hours ahead would have billions.
+// Limit of a file's decoded sound: one minute plus this many samples per byte. Silence has about a
+// thousand in the most compact codecs. Without the limit a wrong time stamp could add hours.
 constexpr int64_t kMostSamplesPerByte = 2048;
 constexpr int64_t kSpareSeconds = 60;
 
@@ -30,12 +30,12 @@ constexpr const char *kMediaSuffixes[] = {
     ".mka", ".mkv", ".mov", ".mp4",  ".mpc",  ".mpeg", ".mpg", ".opus", ".spx",
     ".tak", ".tta", ".voc", ".w64",  ".wav",  ".webm", ".wma", ".wmv",  ".wv"};
 
-// The sound of one run as it comes.
+// The sound of one run of ffmpeg.
 struct decoding {
-    int fd;              // where it goes
+    int fd;              // destination
     int64_t file_bytes;  // of the encoded file
     int64_t most_minutes;
-    std::string header = {};  // its first kHeaderBytes
+    std::string header = {};  // first kHeaderBytes of the sound
     int64_t bytes = 0;
     int32_t rate = 0;  // Hz; 0 until the header is complete
 };

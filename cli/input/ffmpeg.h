@@ -1,7 +1,7 @@
-// Decodes with the ffmpeg program what the library refuses.
+// Decodes files that the library refuses, with the ffmpeg program.
 //
-// In: a file. Out: a WAV file in memory that the library reads: one channel, 16 bits, the file's
-// own rate or the nearest that is accepted, on the time line of players. Called by song_file.h.
+// In: a file. Out: a WAV file in memory for the library: one channel of 16 bits, at the file's own
+// rate or the nearest supported one, on the time line of players. Called by song_file.h.
 #ifndef TAVO_CLI_INPUT_FFMPEG_H
 #define TAVO_CLI_INPUT_FFMPEG_H
 
@@ -10,14 +10,13 @@
 #include "cli/failure.h"
 #include "cli/options.h"
 
-// Decodes the first audio stream of path, or of fd when not negative, into sound_fd, a new
-// descriptor that the caller closes; -1 after a failure. filter: further filters of ffmpeg, each
-// after a comma.
+// Decodes the first audio stream of path, or of fd unless it is negative. sound_fd receives a new
+// descriptor, which the caller closes; -1 after a failure.
 failure decode_with_ffmpeg(const options &opts, const std::string &path, int fd,
                            const std::string &filter, int stop_fd, int &sound_fd);
 
-// True if a file's name ends as those of formats that ffmpeg reads and the library does not. In a
-// folder such files count as audio when there is ffmpeg, whatever they hold.
+// True if a file's name has the extension of a format that ffmpeg reads and the library does not.
+// In a folder such files count as audio if ffmpeg is installed, whatever they contain.
 bool has_media_suffix(const std::string &name);
 
 #endif

@@ -25,21 +25,21 @@
 
 namespace {
 
-constexpr size_t kMostMessageBytes = 65536;  // of the program's messages; the first line counts
-// Address space: a damaged file makes it allocate hours of silence at once.
+constexpr size_t kMostMessageBytes = 65536;  // only the first line is used
+// Limit of the address space. A damaged file can make ffmpeg allocate hours of silence at once.
 constexpr rlim_t kMostProgramBytes = rlim_t{768} << 20;
-constexpr int kReadPollMs = 1000;  // between two looks at the clock
-constexpr int kEndPollMs = 10;     // between two looks at a program that is ending
+constexpr int kReadPollMs = 1000;  // between two checks of the clock
+constexpr int kEndPollMs = 10;     // between two checks whether the program has ended
 
-// Containers that hold their sound themselves. Playlists and scripts (HLS, concat, DASH, SDP, image
-// sequences), which name other files, are not among them.
+// Containers that contain their sound. Playlists and scripts (HLS, concat, DASH, SDP, image
+// sequences) refer to other files and are not accepted.
 constexpr const char *kContainers =
     "aac,ac3,aiff,amr,amrnb,amrwb,ape,asf,au,avi,caf,dsf,dts,dtshd,eac3,flac,flv,iff,loas,matroska,"
     "mlp,mov,mp3,"
     "mpc,mpc8,mpeg,mpegts,mxf,nut,ogg,oma,rm,shn,sox,tak,truehd,tta,voc,w64,wav,wv,xwma";
 
 struct ffmpeg_process {
-    pid_t pid = -1;       // -1 once it was reaped
+    pid_t pid = -1;       // -1 after it was reaped
     int sound_fd = -1;    // standard output
     int message_fd = -1;  // standard error
     std::string message;
@@ -47,7 +47,7 @@ struct ffmpeg_process {
 
 using clock_type = std::chrono::steady_clock;
 
-// The prefix makes any name a file's: -x.mp3, http://x, a:b.mp3.
+// The prefix makes ffmpeg treat any name as a file: -x.mp3, http://x, a:b.mp3.
 std::string input_name(const ffmpeg_task &task) {
     return "file:" + (task.fd >= 0 ? "/dev/stdin" : task.path);
 }
@@ -61,7 +61,8 @@ std::vector<std::string> command_line(const ffmpeg_task &task) {
     return words;
 }
 
-// In the new process. A group of its own keeps Ctrl-C from it: the worker decides.
+// Runs in the new process. In its own group it does not receive Ctrl-C; the worker decides when it
+// stops.
 [[noreturn]] void become_ffmpeg(char *const *words, int input, int output, int messages,
                                 pid_t parent) {
     setpgid(0, 0);
@@ -98,14 +99,14 @@ int start_ffmpeg(const ffmpeg_task &task, ffmpeg_process &process) {
     return code;
 }
 
-// Reads what has come; nothing at the end, which closes fd.
+// Reads the available bytes. At the end of the pipe it closes fd.
 std::string_view read_part(int &fd, std::array<char, 65536> &part) {
     const ssize_t got = read(fd, part.data(), part.size());
     if (got == 0 || (got < 0 && errno != EINTR)) close_fd(fd);
     return {part.data(), static_cast<size_t>(std::max<ssize_t>(got, 0))};
 }
 
-// Reads both pipes until they end, then waits for the end of the process, whose status it stores.
+// Reads both pipes until they end, then waits for the process to end and stores its status.
 failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink, int &status) {
     std::array<char, 65536> part;
     auto deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
@@ -132,7 +133,7 @@ failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink, 
     return {};
 }
 
-// Harmless after the end.
+// Does nothing if the process has ended.
 void kill_ffmpeg(ffmpeg_process &process) {
     close_fd(process.sound_fd);
     close_fd(process.message_fd);
@@ -143,7 +144,7 @@ void kill_ffmpeg(ffmpeg_process &process) {
     process.pid = -1;
 }
 
-// The first line of the messages, without the module's address and the file's name.
+// Returns the first line of the messages, without the module's address and the file's name.
 std::string first_line(const ffmpeg_task &task, const std::string &message) {
     std::string line = message.substr(0, message.find('\n'));
     const size_t module_end = line.find("] ");

@@ -1,7 +1,7 @@
-// Runs the ffmpeg program on one file of any origin.
+// Runs the ffmpeg program on one file, which may come from anywhere.
 //
 // In: a file and the arguments for the output. Out: the bytes of its standard output. Called by
-// ffmpeg.h and write/clip.h, in a worker process.
+// ffmpeg.h and write/clip.h in a worker process.
 #ifndef TAVO_CLI_INPUT_FFMPEG_PROCESS_H
 #define TAVO_CLI_INPUT_FFMPEG_PROCESS_H
 
@@ -15,26 +15,25 @@
 
 struct ffmpeg_task {
     std::string program;                 // path of ffmpeg
-    std::string path;                    // of the file to read, any bytes
-    int fd = -1;                         // read instead of path when not negative; seekable
+    std::string path;                    // of the file to read, any bytes except NUL
+    int fd = -1;                         // read instead of path unless negative; seekable
     std::vector<std::string> arguments;  // everything after the input
 };
 
-// Receives what the program writes to its standard output. A failure ends the program.
+// Receives the program's standard output. A failure ends the program.
 using byte_sink = std::function<failure(std::string_view bytes)>;
 
-// Path of the ffmpeg program that PATH leads to; empty if PATH leads to none.
+// Path of the ffmpeg program in PATH, or an empty string.
 std::string find_ffmpeg();
 
-// Returns after the program has ended: by itself, at a stop (stop_fd readable or closed at its
-// other end), or because it wrote nothing for kIdleSeconds, in which cases it is killed. It reads
-// no other file than the one given, and nothing from the network. A failure is a sentence with the
-// first line of its messages.
+// Runs the program and waits until it has ended. It is killed at a stop (stop_fd readable or closed
+// at its other end) or if it writes nothing for kIdleSeconds. It can read only the given file, and
+// nothing from the network. A failure is a sentence with the first line of the program's messages.
 failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink);
 
 constexpr int kIdleSeconds = 30;
 
-// Players start their time line at 0 and play gaps as silence: so does this filter.
+// Like a player, this filter starts the time line at 0 and fills gaps with silence.
 constexpr const char *kPlayerTimeFilter = "aresample=async=1:first_pts=0";
 
 #endif

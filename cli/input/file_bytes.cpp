@@ -46,7 +46,7 @@ int64_t find_id3v2_end(const std::string &path, int &code) {
         const bool is_tag = head.size() == kHeaderBytes && head.compare(0, 3, "ID3") == 0 &&
                             static_cast<uint8_t>(head[3]) < 0x10 && (length & 0x80808080u) == 0;
         if (!is_tag) return end;
-        int64_t bytes = 0;  // seven bits each
+        int64_t bytes = 0;  // seven bits per byte
         for (int shift = 24; shift >= 0; shift -= 8) {
             bytes = bytes << 7 | static_cast<int64_t>(length >> shift & 0x7F);
         }

@@ -1,4 +1,4 @@
-// From the words of the command line to the files to analyse, one at a time and in their order.
+// Finds the files to analyse, one at a time, in the order of the command line.
 //
 // In: options (files, folders, lists). Out: one input per file. Before: analyse_inputs.h.
 #ifndef TAVO_CLI_INPUT_INPUTS_H
@@ -17,8 +17,8 @@
 #include "cli/options.h"
 
 struct input {
-    std::string path;  // any bytes but NUL
-    failure refusal;   // when the input is known to be unusable already
+    std::string path;  // any bytes except NUL
+    failure refusal;   // if the input is already known to be unusable
 };
 
 using file_id = std::pair<dev_t, ino_t>;
@@ -27,9 +27,9 @@ struct input_supply {
     const options &opts;
     size_t argument = 0;                    // next of opts.inputs, then of opts.lists
     list_reader list = {};                  // being read
-    std::string folder = {};                // being searched; empty for none
-    std::vector<std::string> entries = {};  // in it, to look at, the next one last
-    std::set<file_id> searched = {};        // folders entered in it, and it
+    std::string folder = {};                // being searched, or empty
+    std::vector<std::string> entries = {};  // of folder, not yet examined, in reverse order
+    std::set<file_id> searched = {};        // folder and the folders entered in it
     size_t found = 0;                       // audio files in it
     size_t skipped = 0;                     // other files in it
     size_t existing = 0;                    // inputs left out by --skip-existing
@@ -39,18 +39,19 @@ struct input_supply {
 
 enum class supply_state {
     ready,
-    searching,  // many files were looked at and none was audio: call again
-    waiting,    // for a list; supply_fd becomes readable when there is more
+    searching,  // many files examined, none of them audio: call again
+    waiting,    // for a list; supply_fd becomes readable when more has arrived
     ended,
 };
 
 // Finds the next input. Never waits.
 //
-// Folders are searched for audio files, recognised by content rather than by name; refused formats
-// count as audio, so that they are reported. With --recursive the folders inside are searched too,
-// linked ones included, each once. A file or folder that cannot be read becomes an input with a
-// refusal, and so does a folder without audio. Where the format writes files, no two inputs get the
-// same one. Memory grows with the folders of a search and the marker files, not with a list.
+// Folders are searched for audio files, which are recognised by content, not by name; refused
+// formats count as audio, so that they are reported. With --recursive the folders inside, including
+// linked ones, are searched too, each once. A file or folder that cannot be read becomes an input
+// with a refusal, and so does a folder without audio. If the format writes files, no two inputs get
+// the same one. Memory grows with the folders of a search and the marker files, but not with a
+// list.
 supply_state next_input(input_supply &supply, input &out);
 
 int supply_fd(const input_supply &supply);

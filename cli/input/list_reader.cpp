@@ -15,7 +15,7 @@
 namespace {
 
 constexpr size_t kReadBytes = 65'536;
-constexpr size_t kMostNameBytes = PATH_MAX;  // the system opens nothing longer
+constexpr size_t kMostNameBytes = PATH_MAX;  // the system opens no longer path
 constexpr const char *kByteOrderMark = "\xEF\xBB\xBF";
 
 failure read_more(list_reader &list) {
@@ -29,7 +29,7 @@ failure read_more(list_reader &list) {
     return {};
 }
 
-// A song given in the place of a list would make thousands of names.
+// A song that is passed as a list by mistake would give thousands of names.
 failure check_start(const list_reader &list) {
     const file_kind kind = recognise_bytes(list.text);
     if (kind != file_kind::unknown) {
@@ -48,7 +48,8 @@ bool is_comment(const std::string &line) {
     return line[0] == '#' && lstat(line.c_str(), &info) != 0;
 }
 
-// Removes the next line from the text and returns it, once its separator is there.
+// Removes the next line from the text and returns it. Returns none if its separator has not
+// arrived, unless the list has ended.
 std::optional<std::string> take_line(list_reader &list) {
     const size_t end = list.text.find(list.separator);
     if (end == std::string::npos && (!list.ended || list.text.empty())) return std::nullopt;

@@ -11,11 +11,11 @@
 namespace {
 
 constexpr int64_t kDecoderDelay = 529;  // samples, of every Layer III decoder
-constexpr int32_t kDropRate = 44'100;   // the library drops that delay at this rate in stereo
+constexpr int32_t kDropRate = 44'100;   // Hz; at this rate the library drops that delay in stereo
 constexpr int64_t kLayer1Samples = 384;
 
-// Samples that players drop according to a LAME header in the first frame; 0 without one. frame:
-// the bytes from the frame's start on.
+// Samples that players drop according to the LAME header in the first frame, which starts at frame;
+// 0 without such a header.
 int64_t samples_dropped(std::string_view frame) {
     const auto byte = [&](size_t i) { return static_cast<uint8_t>(frame[i]); };
     const bool is_mpeg1 = (byte(1) >> 3 & 3) == 3;
@@ -37,10 +37,10 @@ int64_t samples_dropped(std::string_view frame) {
 }
 
 double mpeg_offset_ms(const std::string &path, int32_t rate, int32_t channels) {
-    constexpr int64_t kSearchedBytes = 4096;  // for the first frame, after the tags
+    constexpr int64_t kSearchedBytes = 4096;  // searched for the first frame, after the tags
     int code = 0;
     const std::string bytes = read_bytes(path, find_id3v2_end(path, code), kSearchedBytes, code);
-    int64_t dropped = 0;  // by players
+    int64_t dropped = 0;  // samples that players drop
     int64_t library_drops = 0;
     for (std::string_view rest = bytes; rest.size() >= kKindBytes && dropped == 0;
          rest.remove_prefix(1)) {
@@ -55,11 +55,11 @@ double mpeg_offset_ms(const std::string &path, int32_t rate, int32_t channels) {
 
 // A box of an MP4 file.
 struct box {
-    std::string_view type;  // empty for no box
+    std::string_view type;  // empty if there is no box
     std::string_view content;
 };
 
-// Removes the first of the boxes and returns it; removes all if they are damaged.
+// Removes the first box and returns it. Removes all boxes if they are damaged.
 box take_box(std::string_view &boxes) {
     const uint64_t size = big_endian(boxes, 0, 4);
     box first;
@@ -68,7 +68,7 @@ box take_box(std::string_view &boxes) {
     return first;
 }
 
-// Content of the first box of the type; empty if it is not there.
+// Content of the first box of this type, or empty.
 std::string_view find_box(std::string_view boxes, std::string_view type) {
     while (!boxes.empty()) {
         const box next = take_box(boxes);
@@ -77,7 +77,7 @@ std::string_view find_box(std::string_view boxes, std::string_view type) {
     return {};
 }
 
-// Content of the movie box; empty without one.
+// Returns the content of the movie box, or an empty string.
 std::string read_movie(const std::string &path) {
     constexpr int64_t kMostBytes = 256 << 20;
     int code = 0;
@@ -104,8 +104,8 @@ double time_scale(std::string_view header) {
     return std::max(static_cast<double>(big_endian(header, is_long ? 20 : 12, 4)), 1.0);
 }
 
-// The first edits of a track: empty ones delay it, the first other one drops what comes before its
-// media time. False without an edit.
+// Reads the first edits of a track. Empty edits delay the track; the first other edit drops
+// everything before its media time. False if there is no edit.
 bool read_edits(std::string_view list, double movie_scale, double media_scale, double &ms) {
     const bool is_long = big_endian(list, 0, 1) == 1;
     const size_t field = is_long ? 8 : 4;

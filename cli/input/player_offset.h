@@ -1,5 +1,5 @@
-// How much later a time counts in the library than in a player. The library counts from the first
-// sample that it decodes; players leave out the encoder's delay, which the file states.
+// The difference between the library's times and a player's. The library counts from the first
+// sample that it decodes, but players drop the encoder's delay, which the file states.
 //
 // In: an MP3 or MP4 file. Out: milliseconds for record.h. docs/FORMATS.md has the table.
 #ifndef TAVO_CLI_INPUT_PLAYER_OFFSET_H
@@ -8,8 +8,8 @@
 #include <cstdint>
 #include <string>
 
-// Player's time = library's time - offset. rate and channels are those of the library's stream.
-// 0 where the file states nothing, for other formats, and for a file that cannot be read.
+// Returns the offset: player's time = library's time - offset. rate and channels: of the library's
+// stream. Returns 0 if the file states no delay, for other formats, and if the file cannot be read.
 double find_player_offset_ms(const std::string &path, int32_t rate, int32_t channels);
 
 #endif

@@ -27,12 +27,12 @@ constexpr signature kSignatures[] = {
     {file_kind::matroska, "\x1A\x45\xDF\xA3"},
 };
 
-// In the order of file_kind.
+// Ordered as file_kind.
 constexpr const char *kNames[] = {
     "unknown",         "WAV", "AIFF", "FLAC", "Ogg", "MP4", "AAC", "MP3", "ASF (Windows Media)",
     "Matroska or WebM"};
 
-// An MPEG audio or ADTS frame header. A byte order mark of UTF-16 is not taken for one.
+// Recognises an MPEG audio or ADTS frame header. A UTF-16 byte order mark is not one.
 file_kind recognise_frame(std::string_view head) {
     const auto byte = [&](size_t i) { return static_cast<uint8_t>(head[i]); };
     const bool has_sync = byte(0) == 0xFF && (byte(1) & 0xE0) == 0xE0 && byte(1) != 0xFE;

@@ -1,5 +1,5 @@
-// Recognises audio by a file's first bytes rather than by its name, and names its format for
-// people. The library decides what can be analysed.
+// Recognises audio by the first bytes of a file, whatever its name, and names the format for
+// messages. The library decides whether the file can be analysed.
 #ifndef TAVO_CLI_INPUT_RECOGNISE_H
 #define TAVO_CLI_INPUT_RECOGNISE_H
 
@@ -19,16 +19,16 @@ enum class file_kind {
     matroska,
 };
 
-constexpr size_t kKindBytes = 16;  // that recognise_bytes looks at
+constexpr size_t kKindBytes = 16;  // needed by recognise_bytes
 
-// head: the first bytes of a file, or those after its ID3v2 tag.
+// head: the first bytes of a file, or of what follows its ID3v2 tag.
 file_kind recognise_bytes(std::string_view head);
 
-// Returns 0, or errno when the file cannot be opened or read. Anything but a regular file is
-// unknown. Never blocks.
+// Returns 0, or errno if the file cannot be opened or read. Anything but a regular file is unknown.
+// Never blocks.
 int recognise(const std::string &path, file_kind &kind);
 
-// The format's name for people.
+// Returns the format's name for people.
 const char *kind_name(file_kind kind);
 
 #endif

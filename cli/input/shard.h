@@ -1,4 +1,4 @@
-// A share of the inputs, for engines that run one command many times: --shard.
+// A part of the inputs, for schedulers that run one command many times: --shard.
 #ifndef TAVO_CLI_INPUT_SHARD_H
 #define TAVO_CLI_INPUT_SHARD_H
 
@@ -12,12 +12,13 @@ struct shard {
     int64_t count = 1;
 };
 
-// "I/N", I from 1 to N; or "auto": from the environment of a Slurm array (SLURM_ARRAY_TASK_*), a
-// Kubernetes indexed job (JOB_COMPLETION_INDEX) or an AWS Batch array (AWS_BATCH_JOB_ARRAY_*).
-// If the engine does not state N, TAVO_SHARDS must.
+// Parses "I/N" with I from 1 to N, or "auto", which reads the environment of a Slurm array
+// (SLURM_ARRAY_TASK_*), a Kubernetes indexed job (JOB_COMPLETION_INDEX) or an AWS Batch array
+// (AWS_BATCH_JOB_ARRAY_*). If the scheduler does not state N, TAVO_SHARDS must.
 failure read_shard(const std::string &words, shard &out);
 
-// True if the file belongs to the share: by a hash of the path's bytes that is the same everywhere.
+// True if the file belongs to the part. Determined by a hash of the path's bytes that is the same
+// on every machine.
 bool in_shard(const shard &of, const std::string &path);
 
 #endif

@@ -1,4 +1,5 @@
-// The library takes paths of at most 511 bytes and treats the path "fd" specially.
+// Replaces a path that the library cannot open. The library accepts paths of at most 511 bytes and
+// treats the path "fd" specially.
 #ifndef TAVO_CLI_INPUT_SHORT_PATH_H
 #define TAVO_CLI_INPUT_SHORT_PATH_H
 
@@ -6,10 +7,10 @@
 
 struct short_path {
     std::string path;  // for the library
-    int fd = -1;       // kept open while path is used, -1 for none
+    int fd = -1;       // kept open while path is used, or -1
 };
 
-// Never fails: where nothing helps, the path stays as it is and the library refuses it.
+// Never fails. If a path cannot be replaced, it stays as it is, and the library refuses it.
 short_path open_short_path(const std::string &path);
 void close_short_path(short_path &opened);
 

@@ -21,9 +21,9 @@
 
 namespace {
 
-constexpr off_t kMostPipeBytes = off_t{4} << 30;  // memory for what comes through a pipe
+constexpr off_t kMostPipeBytes = off_t{4} << 30;  // memory for data from a pipe
 
-// The descriptor that a path of the system names, -1 if it names none.
+// Returns the descriptor that a path such as /dev/stdin refers to, or -1.
 int named_descriptor(const std::string &path) {
     int fd = -1;
     if (path == "/dev/stdin") return STDIN_FILENO;
@@ -35,7 +35,7 @@ int named_descriptor(const std::string &path) {
     return -1;
 }
 
-// A pipe or socket that the command was started with. Its own ones close on exec.
+// True for a pipe or socket that the command inherited. Its own ones are close-on-exec.
 bool is_inherited_pipe(int fd) {
     struct stat info {};
     return fd >= 0 && fstat(fd, &info) == 0 && (S_ISFIFO(info.st_mode) || S_ISSOCK(info.st_mode)) &&

@@ -1,5 +1,5 @@
-// A song as the library can open it: the file itself, what came through a pipe, or what ffmpeg
-// decoded.
+// A song in a form that the library can open: the file itself, the contents of a pipe, or the
+// output of ffmpeg.
 //
 // In: a path of the command line. Out: a path for the library. Called by run/analyse.h.
 #ifndef TAVO_CLI_INPUT_SONG_FILE_H
@@ -11,31 +11,31 @@
 #include "cli/options.h"
 
 struct song_file {
-    std::string path;        // for the library; holds at least until close_song
-    int fd = -1;             // kept open for path, -1 for none
-    int source_fd = -1;      // what the song was before ffmpeg decoded it; -1 if a file
-    bool by_ffmpeg = false;  // path leads to ffmpeg's sound
+    std::string path;        // for the library; valid at least until close_song
+    int fd = -1;             // kept open for path, or -1
+    int source_fd = -1;      // source of the sound that ffmpeg decoded, or -1 if it is a file
+    bool by_ffmpeg = false;  // path is the sound decoded by ffmpeg
 };
 
-// Opens a file, or reads a pipe that the command was started with (/dev/stdin, /dev/fd/N) to its
-// end. Waits for no other file. After a failure there is nothing to close.
+// Opens a file, or reads an inherited pipe (/dev/stdin, /dev/fd/N) to its end. Does not wait for
+// any other file. After a failure there is nothing to close.
 failure open_song(const std::string &path, int stop_fd, song_file &song);
 
-// True if the library refuses the song for a reason that ffmpeg may not have: its format, its
-// coding or its rate.
+// True if the library refuses the song because of its format, coding or sample rate, so that ffmpeg
+// may be able to decode it.
 bool needs_ffmpeg(const song_file &song);
 
-// Replaces the song by what ffmpeg decodes of it. After a failure, as without ffmpeg, the song is
-// as before.
+// Replaces the song by the output of ffmpeg. After a failure, or without ffmpeg, the song is
+// unchanged.
 failure decode_song(const std::string &path, const options &opts, int stop_fd, song_file &song);
 
-// Decodes the song at path, which is open as song, with ffmpeg into a second one: the channel that
-// the library analyses, from offset_ms before the player's time 0, each sample multiplied by gain
-// and saturated. After a failure there is nothing to close.
+// Decodes the song again with ffmpeg, into raised: the channel that the library analyses, from
+// offset_ms before the player's time 0 on, with each sample multiplied by gain and clipped. path:
+// of the song, which is open as song. After a failure there is nothing to close.
 failure raise_song(const std::string &path, const options &opts, int stop_fd, const song_file &song,
                    double gain, double offset_ms, song_file &raised);
 
-// Harmless when called twice.
+// May be called twice.
 void close_song(song_file &song);
 
 #endif

@@ -1,4 +1,4 @@
-// The pages of --report as templates. Their sources are in cli/report/; the build joins them.
+// The pages of --report as templates. The build generates them from the sources in cli/report/.
 #ifndef TAVO_CLI_REPORT_REPORT_PAGES_H
 #define TAVO_CLI_REPORT_REPORT_PAGES_H
 

@@ -15,8 +15,8 @@
 
 namespace {
 
-constexpr size_t kMostAhead = 10'000;   // inputs found before they can be analysed
-constexpr size_t kFoundAtOnce = 64;     // before the workers are served again
+constexpr size_t kMostAhead = 10'000;   // inputs found but not yet being analysed
+constexpr size_t kFoundAtOnce = 64;     // inputs found before the workers are served again
 constexpr size_t kMostWaiting = 1'000;  // results that wait for an earlier one
 
 struct run_state {
@@ -29,10 +29,10 @@ struct run_state {
     ordered_output output = {};
     store db = {};
     bool is_ending = false;  // no more jobs are sent
-    bool has_error = false;  // one that concerns no single file
+    bool has_error = false;  // an error that does not belong to a file
 };
 
-// Writes a message if there was a failure that concerns no single file. Returns true if so.
+// Prints a failure that does not belong to a single file. Returns true if there was one.
 bool report(run_state &state, const failure &failed) {
     if (!failed) return false;
     state.has_error = true;
@@ -66,7 +66,7 @@ supply_state find_next(run_state &state, job &next) {
     return found ? supply_state::ready : supply_state::ended;
 }
 
-// True if the input belongs to this command's share and is not stored yet.
+// True if the input belongs to this command's shard and is not stored yet.
 bool is_wanted(run_state &state, job &next) {
     if (!in_shard(state.opts.share, next.message.path)) return false;
     if (state.opts.from_store || next.refusal) return true;
@@ -80,7 +80,7 @@ bool may_search(const run_state &state) {
            state.queue.size() < kMostAhead;
 }
 
-// Finds a few more inputs, unless enough are queued.
+// Finds a few more inputs unless enough are queued.
 void search_inputs(run_state &state) {
     for (size_t i = 0; i < kFoundAtOnce && may_search(state); ++i) {
         job next;
@@ -115,7 +115,7 @@ void send_jobs(run_state &state) {
     }
 }
 
-// How long poll may wait: the shortest of the times of which each may be -1, which is forever.
+// Time that poll may wait: the shortest of the given times, where -1 means no limit.
 int wait_ms(const run_state &state) {
     int shortest = state.output.bar.shown ? kRedrawMs : -1;
     for (const int wait : {batch_timeout_ms(state.db), deadline_timeout_ms(state.pool)}) {
@@ -143,7 +143,7 @@ void wait_and_serve(run_state &state) {
     draw_progress(state.output.bar, state.output.done, state.output.total);
 }
 
-// Ends the workers once nothing is left to do, or at a stop.
+// Ends the workers at a stop or if no work is left.
 void end_if_done(run_state &state) {
     if (state.is_ending) return;
     const bool is_stop = stop_requested() || output_failed(state.output) || state.db.has_failed;

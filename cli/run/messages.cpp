@@ -6,7 +6,7 @@
 
 namespace {
 
-// A message consists of texts, each after its size.
+// A message consists of texts, each preceded by its size.
 std::string join(std::initializer_list<std::string_view> texts) {
     std::string message;
     for (const std::string_view text : texts) {

@@ -1,4 +1,4 @@
-// The messages between the command and a worker process. A worker has one request at a time.
+// Messages between the command and a worker process. A worker has one request at a time.
 #ifndef TAVO_CLI_RUN_MESSAGES_H
 #define TAVO_CLI_RUN_MESSAGES_H
 
@@ -10,15 +10,15 @@
 struct request {
     uint64_t index = 0;  // of the input
     std::string path;
-    std::string stored;  // its result as JSON, if the store had it; empty otherwise
+    std::string stored;  // the result as JSON, if the store has it; otherwise empty
 };
 
 struct reply {
     outcome status = outcome::failed;
     std::string result;   // for standard output
     std::string message;  // for standard error
-    std::string json;     // the result for the store, if it belongs there
-    std::string row;      // of the report's index, if it has one
+    std::string json;     // the result to store, or empty
+    std::string row;      // of the report's index, or empty
 };
 
 std::string encode(const request &message);

@@ -23,7 +23,8 @@ using std::chrono::steady_clock;
 
 constexpr milliseconds kStopPatience{1000};
 
-// Runs in the new process. It closes the sockets of the other workers: their ends are signals.
+// Runs in the new process. It closes the sockets of the other workers, because a closed socket is a
+// signal.
 [[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_files *files, int fd) {
     for (worker_process &other : pool.processes) close_fd(other.fd);
     ignore_stop_signals();
@@ -56,7 +57,7 @@ failure start_process(process_pool &pool) {
     return {};
 }
 
-// The result of a job whose worker ended without replying.
+// Returns the result of a job whose worker ended without a reply.
 record unfinished_record(const process_pool &pool, const worker_process &worker, int status) {
     record result = failed_record(worker.current.message.path, pool.opts.mode, "");
     if (pool.is_stopping) {
@@ -124,7 +125,7 @@ void send_job(const process_pool &pool, worker_process &worker, job &&next) {
     if (pool.opts.timeout_s > 0) {
         worker.deadline = steady_clock::now() + std::chrono::seconds(pool.opts.timeout_s);
     }
-    // If the worker has died, read_from finds out: no need to check here.
+    // If the worker has died, read_from detects it, so no check is needed here.
     write_all(worker.fd, encode(worker.current.message));
 }
 

@@ -1,9 +1,10 @@
-// Starts, feeds, stops and reaps the worker processes. The library allows one instance per process:
-// with workers several files are analysed at once, and a crash costs one file.
+// Starts, feeds, stops and reaps the worker processes. The library allows one instance per process,
+// so workers are needed to analyse several files at once. A crash of a worker affects one file
+// only.
 //
-// The command and a worker talk through a pair of sockets. The command's end of writing stops the
-// analysis and the worker; the worker's end shows as the end of its replies. The command is
-// single-threaded, so that it can fork at any moment.
+// The command and a worker are connected by a pair of sockets. When the command closes its end for
+// writing, the worker stops its analysis and ends. When a worker ends, the command reads the end of
+// its replies. The command is single-threaded, so that it can fork at any moment.
 #ifndef TAVO_CLI_RUN_PROCESS_POOL_H
 #define TAVO_CLI_RUN_PROCESS_POOL_H
 
@@ -31,12 +32,12 @@ struct job {
 using time_point = std::chrono::steady_clock::time_point;
 
 struct worker_process {
-    pid_t pid = -1;  // -1 once it was reaped
+    pid_t pid = -1;  // -1 after it was reaped
     int fd = -1;     // socket
     bool is_busy = false;
     job current;                              // while busy
     std::string received;                     // start of a reply
-    time_point deadline = time_point::max();  // the worker is killed then
+    time_point deadline = time_point::max();  // time at which the worker is killed
     temporary_files *files = nullptr;         // shared with the worker
 };
 
@@ -58,13 +59,13 @@ void send_job(const process_pool &pool, worker_process &worker, job &&next);
 
 bool has_busy(const process_pool &pool);
 
-// Asks the workers to end. With is_stop they give up their jobs and are killed if they have not
-// ended after a second. Call it once; no job may be sent afterwards.
+// Asks the workers to end. With is_stop they abort their jobs, and are killed if they have not
+// ended after one second. Call it once; no job may be sent afterwards.
 void end_workers(process_pool &pool, bool is_stop);
 
 // For poll: appends one entry for each worker, in their order.
 void append_watched(const process_pool &pool, std::vector<pollfd> &watched);
-int deadline_timeout_ms(const process_pool &pool);  // -1 without a deadline
+int deadline_timeout_ms(const process_pool &pool);  // -1 if there is no deadline
 
 // Reads the replies, kills workers past their deadline and reaps those that have ended. watched:
 // the entries of append_watched, after poll.

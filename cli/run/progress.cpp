@@ -12,7 +12,7 @@
 
 namespace {
 
-constexpr double kFirstDrawSeconds = 1.0;  // no bar for shorter work
+constexpr double kFirstDrawSeconds = 1.0;  // shorter work has no bar
 constexpr size_t kMostBarColumns = 40;
 constexpr size_t kUsualColumns = 80;
 
@@ -47,7 +47,7 @@ void draw_progress(progress &bar, size_t done, size_t total) {
     if (run.count() < kFirstDrawSeconds) return;
 
     const std::string tail = numbers(done, total, run.count());
-    const size_t columns = terminal_columns() - 1;  // the last one makes some terminals wrap
+    const size_t columns = terminal_columns() - 1;  // some terminals wrap after the last column
     const size_t room = columns > tail.size() + 2 ? columns - tail.size() - 2 : 0;
     const size_t width = std::min(room, kMostBarColumns);
     std::string line;

@@ -15,8 +15,8 @@ constexpr int kRedrawMs = 500;  // between two redraws
 
 progress start_progress(bool quiet);
 
-// Redraws the line once the work has taken a second, but not for a single file. total: files; 0
-// while not all are known.
+// Redraws the line if the work has taken at least a second, except for a single file. total: number
+// of files, or 0 if it is not known yet.
 void draw_progress(progress &bar, size_t done, size_t total);
 
 // Clears the line. Call it before writing anything else to the terminal.

@@ -11,7 +11,7 @@ bool watch_for_stop();
 void ignore_stop_signals();
 
 bool stop_requested();
-int stop_signal();  // its number, 0 without a request
-int stop_fd();      // becomes readable at the first signal
+int stop_signal();  // number of the signal, or 0
+int stop_fd();      // becomes readable after the first signal
 
 #endif

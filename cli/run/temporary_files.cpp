@@ -42,7 +42,7 @@ void note_temporary_file(const std::string &path) {
     if (own_files == nullptr || path.size() >= PATH_MAX) return;
     for (auto &slot : own_files->paths) {
         if (slot[0] != '\0') continue;
-        // The first character comes last: until then the slot counts as free.
+        // The first character is written last, because the slot counts as free until then.
         memcpy(slot + 1, path.c_str() + 1, path.size());
         slot[0] = path[0];
         return;

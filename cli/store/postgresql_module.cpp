@@ -1,4 +1,5 @@
-// Loads the module with PostgreSQL's client library, which depends on two dozen others, on demand.
+// Loads the module with PostgreSQL's client library on demand, because that library depends on two
+// dozen others.
 #include <dlfcn.h>
 
 #include "cli/store/database.h"

@@ -30,7 +30,7 @@ struct stored_song {
     std::string path;    // any bytes
     file_state file;     // before the analysis
     std::string result;  // the object of --format json
-    failure damage;      // of a row that was read: it is damaged
+    failure damage;      // set if the row that was read is damaged
 };
 
 struct store {
@@ -39,7 +39,7 @@ struct store {
     std::string location;
     void *handle = nullptr;          // null while disconnected
     int version = 0;                 // of the table
-    bool has_failed = false;         // the store was given up, and the run ends
+    bool has_failed = false;         // the store is no longer used, and the run ends
     std::vector<stored_song> batch;  // not committed yet
     std::chrono::steady_clock::time_point batch_since;
     std::deque<stored_song> page;  // with --from-store: rows that were read, not yet returned
@@ -49,24 +49,24 @@ struct store {
     int64_t known_failed = 0;      // of these, songs stored as failed
 };
 
-// These try again while the database does not answer, waiting longer each time, for --patience;
-// each wait is announced on standard error and ends at a stop. After a failure the store is given
+// These functions retry while the database does not answer, with growing pauses, for --patience.
+// Each pause is reported on standard error and ends at a stop. After a failure the store is given
 // up.
 
-// Connects and, unless the store is only read, makes or upgrades the table. Does not try again.
+// Connects and, unless the store is only read, creates or upgrades the table. Does not retry.
 failure open_store(store &db, const options &opts);
 
 // Sets is_new if the song must be analysed: its current file is not stored for these parameters, or
 // the options ask for it again.
 failure find_song(store &db, const std::string &path, file_state &file, bool &is_new);
 
-// Adds a result to the batch and commits the batch if it is full or old. Once the store was given
-// up, results stay in the batch for close_store.
+// Adds a result to the batch and commits the batch if it is full or old. If the store has been
+// given up, results stay in the batch for close_store.
 failure add_song(store &db, stored_song &&song);
 
 // Commits a batch that is old.
 failure commit_old_batch(store &db);
-int batch_timeout_ms(const store &db);  // until then, for poll; -1 for never
+int batch_timeout_ms(const store &db);  // timeout for poll; -1 if none
 
 // With --from-store: the next row of these parameters, in the order of the paths. found is false
 // after the last one.

@@ -5,8 +5,8 @@
 #include "cli/write/json.h"
 #include "cli/write/value_text.h"
 
-// A name that is not UTF-8 cannot stand in JSON: file then has U+FFFD in place of the bytes in
-// question, and file_bytes holds the exact name, percent-encoded.
+// JSON cannot contain a name that is not UTF-8. file then has U+FFFD instead of the invalid bytes,
+// and file_bytes has the exact name, percent-encoded.
 std::string json_record(const record &result) {
     result_json object;
     object["file"] = as_utf8(result.file);
