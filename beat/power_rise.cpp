@@ -39,7 +39,7 @@ double level_db(int32_t level) {
 }
 
 // Computes the sum of the ten squares around each of count (even) samples from first on, added in
-// their order. Passes the sums to use in pairs.
+// their order. Calls use for each pair of sums.
 template <typename Use>
 void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
     double squares[kChunk + 2 * kSumRadius] = {};

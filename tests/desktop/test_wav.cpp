@@ -15,7 +15,7 @@ samples make_samples(size_t count) {
     return pcm;
 }
 
-// Returns the file with the number of size bytes at an offset replaced.
+// Returns the file after replacing the number of size bytes at an offset.
 std::string patch(std::string file, size_t at, uint64_t value, size_t size = 2) {
     return file.replace(at, size, reinterpret_cast<const char *>(&value), size);  // little-endian
 }

@@ -236,7 +236,7 @@ TEST(Search, RequestedLengthMovesTheStart) {
     const char *valley_first = "20 0.5 1 0.1 9 0.5 20 1 5 0.5 1 0.1 4 0.5";
     const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
     const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
-    // One loud point is not a segment; two are one, (19, 21). The region ends at 27.
+    // A single loud point is not a segment, but two are: (19, 21). The region ends at 27.
     const char *one = "20 0.5 1 1 39 0.5", *two = "20 0.5 2 1 38 0.5";
     const struct {
         const char *curve;

@@ -107,7 +107,7 @@ TEST(Recognise, FirstBytesDetermineTheType) {
     EXPECT_EQ(type_of(kAsf, [](mtsrc_file *, const int64_t *) { return -1; }), -6);
 }
 
-// The header, and the same header at a distance, which is the end of the file.
+// The header twice, a distance apart. The second one is at the end of the file.
 std::string pair(const std::string &header, size_t distance) {
     return put(header, distance, header + zeros(1));
 }

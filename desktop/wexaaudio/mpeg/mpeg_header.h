@@ -29,7 +29,7 @@ bool mpeg_parse(const uint8_t *p, mpeg_header *h);
 bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
 
 // True if a stream's first frame contains an encoder's table (Xing, Info, VBRI) instead of music.
-// p: the frame's first bytes bytes.
+// p: the first bytes of the frame, as many as `bytes`.
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
 
 // Sets how a stream of such frames is decoded, bare or in a container.
