@@ -50,7 +50,7 @@ bool is_comment(const std::string &line) {
 
 // Removes the next line from the text and returns it. Returns none if its separator has not
 // arrived, unless the list has ended.
-std::optional<std::string> take_line(list_reader &list) {
+std::optional<std::string> read_line(list_reader &list) {
     const size_t end = list.text.find(list.separator);
     if (end == std::string::npos && (!list.ended || list.text.empty())) return std::nullopt;
     std::string line = list.text.substr(0, end);
@@ -77,7 +77,7 @@ failure read_name(list_reader &list, std::optional<std::string> &name) {
             if (failure failed = check_start(list)) return failed;
             if (list.text.compare(0, 3, kByteOrderMark) == 0) list.text.erase(0, 3);
         }
-        while ((name = take_line(list))) {
+        while ((name = read_line(list))) {
             if (name->empty() || (list.separator == '\n' && is_comment(*name))) continue;
             ++list.names;
             return {};

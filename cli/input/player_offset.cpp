@@ -60,7 +60,7 @@ struct box {
 };
 
 // Removes the first box and returns it. Removes all boxes if they are damaged.
-box take_box(std::string_view &boxes) {
+box read_box(std::string_view &boxes) {
     const uint64_t size = big_endian(boxes, 0, 4);
     box first;
     if (size >= 8 && size <= boxes.size()) first = {boxes.substr(4, 4), boxes.substr(8, size - 8)};
@@ -71,7 +71,7 @@ box take_box(std::string_view &boxes) {
 // Content of the first box of this type, or empty.
 std::string_view find_box(std::string_view boxes, std::string_view type) {
     while (!boxes.empty()) {
-        const box next = take_box(boxes);
+        const box next = read_box(boxes);
         if (next.type == type) return next.content;
     }
     return {};
@@ -141,7 +141,7 @@ double mp4_offset_ms(const std::string &path, int32_t rate) {
     const double movie_scale = time_scale(find_box(movie, "mvhd"));
     const double tag_ms = tag_offset_ms(movie, rate);
     for (std::string_view boxes = movie; !boxes.empty();) {
-        const box track = take_box(boxes);
+        const box track = read_box(boxes);
         const std::string_view media = find_box(track.content, "mdia");
         if (track.type != "trak" || big_endian(find_box(media, "hdlr"), 8, 4) != kSound) continue;
         const std::string_view edits = find_box(find_box(track.content, "edts"), "elst");
