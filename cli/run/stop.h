@@ -7,7 +7,7 @@
 // Returns false with errno if the system refuses.
 bool watch_for_stop();
 
-// Ignores these signals in a worker process, which ends with its request pipe.
+// Ignores these signals in a worker process, which ends when its socket is closed.
 void ignore_stop_signals();
 
 bool stop_requested();
