@@ -101,6 +101,14 @@ enum {
     TAVO_LOUDNESS_WINDOW_MS = 6000 /**< length of a window */
 };
 
+/** The margins of the highlight search: values of the loudness curve where it looks for no rise. */
+enum {
+    TAVO_SHORT_SONG_S = 90,     /**< a song of fewer seconds has the narrower margins */
+    TAVO_SEARCH_SKIP = 9,       /**< values at the start; 0 in a short song */
+    TAVO_SEARCH_TAIL = 25,      /**< values at the end */
+    TAVO_SHORT_SEARCH_TAIL = 10 /**< values at the end of a short song */
+};
+
 /** One analysis, from tavo_init to tavo_deinit. Its fields are private. */
 typedef struct TAVO_CTX TAVO_CTX;
 
@@ -216,6 +224,35 @@ int32_t tavo_is_complete(const TAVO_CTX *ctx);
  * Returns null with *count 0 before the end of the job, in mode 1, for audio shorter than a
  * window, or for a bad handle. count must not be null. */
 const float *tavo_get_loudness(const TAVO_CTX *ctx, int32_t *count);
+
+/** An open file whose samples are read from its start on. Its fields are private. */
+typedef struct mtsrc_ctx mtsrc_ctx;
+
+/** The input of mtsrc_init, which copies the path. */
+typedef struct mtsrc_param {
+    const char *path; /**< NUL-terminated, at most 511 bytes */
+} mtsrc_param;
+
+/** A read request. */
+typedef struct mtsrc_frame {
+    void *data;   /**< receives 16-bit mono samples at the stream's rate, in native byte order */
+    int32_t size; /**< receives the number of bytes delivered */
+} mtsrc_frame;
+
+/** Opens a file to read its samples, for instance to draw them; an analysis does not need it.
+ * Returns a handle, which the caller releases with mtsrc_deinit, with *err 0. On failure returns
+ * null with *err -2 out of memory; -3 unknown or unsupported format, or path too long; -4 no path;
+ * -6 cannot be read, or shorter than 16 bytes; -7 cannot be opened, or no usable audio; -255 codec
+ * library. */
+mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err);
+
+/** Delivers want bytes; up to 917,506 bytes always fit. Returns 0 if it delivered exactly want
+ * bytes; 1 if the stream ended, with the remaining bytes delivered; -2 out of memory; -4 bad handle
+ * or frame, or want negative or too large; -6 read or decode failure. */
+int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
+
+/** Releases everything. Returns -5 (done); -4 bad handle. */
+int32_t mtsrc_deinit(mtsrc_ctx *src);
 
 /** The path of the diagnostic click track (mono 16-bit WAV at 11025 Hz). Modes 1 and 2 write it
  * at the end of every beat analysis and overwrite an existing file. By default it is in the

@@ -3,18 +3,13 @@
 /// of any size and seeks by time.
 ///
 /// In: a path. Out: PCM at the stream's own rate, native byte order. Called by pcm/decode.h. A
-/// source is used by one thread at a time; different sources share nothing.
+/// source is used by one thread at a time; different sources share nothing. The handle,
+/// mtsrc_init, mtsrc_getstream and mtsrc_deinit are declared in tavo.h.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_H
 #define TAVO_MEDIA_SOURCE_MTSRC_H
 
+#include "include/tavo.h"
 #include "media_source/mtsrc_io.h"
-
-struct mtsrc_ctx;  // the handle
-
-/// Argument of mtsrc_init.
-struct mtsrc_param {
-    const char *path;  ///< NUL-terminated, at most 511 bytes; copied
-};
 
 /// Format of the stream that a source delivers.
 struct mtsrc_format {
@@ -24,12 +19,6 @@ struct mtsrc_format {
     int64_t duration;     ///< 100-ns units
 };
 static_assert(offsetof(mtsrc_format, duration) == 16);
-
-/// A read request.
-struct mtsrc_frame {
-    void *data;    ///< buffer for the bytes requested
-    int32_t size;  ///< receives the bytes delivered
-};
 
 // Results other than 0 and the negative codes of tavo.h.
 constexpr int32_t kMtsrcEndOfStream = 1;  ///< mtsrc_getstream: delivered what was left
@@ -49,14 +38,9 @@ constexpr int32_t kMtsrcTypeUnknown = 2199;    ///< none of the above
 
 extern "C" {
 
-/// Opens the file. Returns a handle, which the caller releases with mtsrc_deinit, with *err 0. On
-/// failure returns null with *err -2 out of memory; -3 unknown or unsupported format, or path too
-/// long; -4 no path; -6 cannot be read for recognition (shorter than 16 bytes); -7 cannot be opened
-/// or no usable audio; -255 codec library.
-mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err);
-
 /// Opens a file through the caller's callbacks, which are copied. On success the handle owns
-/// io->path and releases it with free; on failure the caller still owns it. flags: not used, 0.
+/// io->path and releases it with free; on failure the caller still owns it. Returns as mtsrc_init.
+/// flags: not used, 0.
 mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t flags, int32_t *err);
 
 /// Returns 0; -4 bad handle or null fmt.
@@ -67,16 +51,8 @@ int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt);
 /// failed seek, after which the queue is empty.
 int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached);
 
-/// Delivers want bytes; up to 917,506 bytes always fit the queue. Returns 0 if it delivered exactly
-/// want bytes; 1 if the stream ended, with the remaining bytes delivered; -2 out of memory; -4 bad
-/// handle or frame, or want negative or greater than the queue can hold; -6 read or decode failure.
-int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
-
 /// Empties the queue and resets the decoder. Returns -5 (done); -4 bad handle.
 int32_t mtsrc_reset(mtsrc_ctx *src);
-
-/// Releases everything. Returns -5 (done); -4 bad handle.
-int32_t mtsrc_deinit(mtsrc_ctx *src);
 
 /// Recognises an open file by its content and restores the file offset. Returns 0 with *type set,
 /// kMtsrcTypeUnknown if no probe matches; -6 if 16 bytes cannot be read.
