@@ -28,14 +28,19 @@ constexpr int32_t kMostBeats = 1'000'000'000;
 constexpr size_t kOptionColumns = 28;  // of the names in --help
 constexpr size_t kTextColumns = 80 - kOptionColumns;
 
-// In the order of result_format.
-const std::vector<std::string> kFormats = {"text",     "json", "csv",        "labels",
-                                           "kdenlive", "llc",  "ffmetadata", "edl",
-                                           "fcpxml",   "otio", "reaper"};
+// In the order of result_format. The formats of markers follow.
+const std::vector<std::string> kFormats = {"text", "json", "csv"};
 
-result_format format_of(const std::string &word) {
+std::vector<std::string> format_words() {
+    std::vector<std::string> words = kFormats;
+    for (const marker_format &entry : marker_formats()) words.emplace_back(entry.word);
+    return words;
+}
+
+void set_format(const std::string &word, options &out) {
     const auto entry = std::find(kFormats.begin(), kFormats.end(), word);
-    return static_cast<result_format>(entry - kFormats.begin());
+    out.format = static_cast<result_format>(entry - kFormats.begin());
+    out.markers = find_marker_format(word);
 }
 
 // Breaks the line at spaces.
@@ -132,12 +137,12 @@ void declare_analysis(CLI::App &app, options &out) {
 
 void declare_output(CLI::App &app, options &out) {
     app.add_option_function<std::string>(
-           "-f,--format", [&out](const std::string &word) { out.format = format_of(word); },
+           "-f,--format", [&out](const std::string &word) { set_format(word, out); },
            "text (default) for people, json: one object a line, csv: one row a file; or "
            "markers for an editor, a file beside each input: labels (Audacity), kdenlive, "
            "llc (LosslessCut), ffmetadata (chapters), edl (DaVinci Resolve), fcpxml, otio, "
            "reaper. Markers span 30 s of highlight without --length")
-        ->check(CLI::IsMember(kFormats).description(""))
+        ->check(CLI::IsMember(format_words()).description(""))
         ->type_name("FORMAT");
     add_text(app, "--print", out.print, "TEXT",
              "Write this text for each song, with {file}, {stem}, {hl_s}, {hl_ms}, {end_s}, {bpm} "
@@ -240,10 +245,8 @@ failure first_of(std::initializer_list<contradiction> table) {
 }
 
 failure check_output(const CLI::App &app, const options &out) {
-    const bool has_files = writes_files(out.format);
-    const bool has_frames = out.format == result_format::edl ||
-                            out.format == result_format::fcpxml ||
-                            out.format == result_format::otio;
+    const bool has_files = out.markers != nullptr;
+    const bool has_frames = has_files && out.markers->counts_frames;
     const bool has_click = !out.click.empty();
     std::string sample;
     const failure bad_template = fill_template(out.print, {}, sample);
@@ -306,7 +309,7 @@ failure check_inputs(const options &out) {
         {out.redo && out.retry_failed, "--redo analyses failed songs too."},
         {out.from_store && has_inputs, "--from-store takes no other inputs."},
         {out.failed && !out.from_store, "--failed goes with --from-store."},
-        {out.failed && (writes_files(out.format) || has_page),
+        {out.failed && (out.markers != nullptr || has_page),
          "--failed goes with --format text, json or csv."},
         {out.from_store && out.format == result_format::none && !has_page,
          "--from-store needs --format or --report."},

@@ -14,19 +14,13 @@ enum class result_format {
     text,
     json,
     csv,
-    // marker files
-    labels,
-    kdenlive,
-    llc,
-    ffmetadata,
-    edl,
-    fcpxml,
-    otio,
-    reaper,
+    markers,  // a file for each input, of the kind options.markers
     // without a word for --format
     print,  // --print
     none,   // nothing: the store has the results
 };
+
+struct marker_format;  // write/markers.h
 
 struct options {
     int32_t mode = TAVO_MODE_BOTH;
@@ -34,6 +28,7 @@ struct options {
     int32_t max_beats = 0;      // 0 for no limit
     int32_t max_minutes = 600;  // longer audio is refused
     result_format format = result_format::text;
+    const marker_format *markers = nullptr;  // of the format markers
     std::string print;       // template of the format print
     std::string click;       // where the click track goes, empty for none
     std::string clip;        // where clips go, a file or a folder; empty for none

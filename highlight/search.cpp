@@ -174,8 +174,8 @@ uint32_t search_curve(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm, fl
     s.norm = norm;
     s.diff = diff;
     s.n = hl->power_count;
-    s.skip = duration_s < kShortSongSeconds ? 0 : kSearchSkip;
-    s.tail = duration_s < kShortSongSeconds ? kShortSearchTail : kSearchTail;
+    s.skip = duration_s < TAVO_SHORT_SONG_S ? 0 : TAVO_SEARCH_SKIP;
+    s.tail = duration_s < TAVO_SHORT_SONG_S ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
     if (s.n - s.skip <= kMinPoints) return 0;
 
     float largest = 0.0f;

@@ -7,12 +7,6 @@
 
 #include "common/tavo_ctx.h"
 
-// Limits of the search, in points of the curve (2 s each) unless a unit is given.
-constexpr int32_t kShortSongSeconds = 90;  // seconds; longer songs have the wider margins
-constexpr int32_t kSearchSkip = 9;   // first point where an edge is searched; 0 in a short song
-constexpr int32_t kSearchTail = 25;  // points before the end where no edge is scored
-constexpr int32_t kShortSearchTail = 10;
-
 extern "C" {
 
 // duration_s: the song's length in whole seconds. Returns milliseconds, or 0 if nothing is found.

@@ -1,12 +1,10 @@
 // What the page's worker calls. Strings are UTF-8; a returned one is freed by the caller with free.
-#include <unistd.h>
-
 #include <cstdint>
 #include <cstring>
 #include <string>
 
-#include "cli/report/song_json.h"
-#include "cli/write/format.h"
+#include "cli/report/song_view.h"
+#include "cli/write/json.h"
 #include "cli/write/markers.h"
 #include "include/tavo.h"
 
@@ -69,16 +67,14 @@ extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, i
     result.length_s = length_s;
     analyse_song(result, max_beats);
     result.channels = channels;
-    song_view view;
-    int stop_pipe[2] = {-1, -1};  // nobody writes to it: a page stops its worker
-    if (result.status == outcome::ok && pipe(stop_pipe) == 0) {
-        const outcome status =
-            read_song_view(result, kReportColumns, stop_pipe[0], view, result.error);
-        result.status = status;
-    }
     result_json out;
-    if (result.status == outcome::ok) out["song"] = song_json(result, view);
-    out["result"] = result_json::parse(json_record(result));
+    if (result.status == outcome::ok) {
+        if (const failure failed = read_song_view(result, -1, out["song"])) {
+            result = failed_record(path, mode, failed.sentence);
+            out.erase("song");
+        }
+    }
+    out["result"] = json_object(result);
     return strdup(out.dump().c_str());
 }
 
@@ -86,24 +82,11 @@ extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, i
 // null for an unknown format.
 extern "C" char *web_markers(const char *result, int32_t length_s, const char *format,
                              const char *fps) {
-    constexpr struct {
-        const char *word;
-        result_format format;
-    } kFormats[] = {
-        {"labels", result_format::labels}, {"kdenlive", result_format::kdenlive},
-        {"llc", result_format::llc},       {"ffmetadata", result_format::ffmetadata},
-        {"edl", result_format::edl},       {"fcpxml", result_format::fcpxml},
-        {"otio", result_format::otio},     {"reaper", result_format::reaper},
-    };
     record song = record_from_json(result);
     song.file = result_json::parse(result).value("file", "");
     song.length_s = length_s;
     options opts;
     opts.fps = fps;
-    for (const auto &entry : kFormats) {
-        if (strcmp(entry.word, format) != 0) continue;
-        opts.format = entry.format;
-        return strdup(marker_content(song, opts).c_str());
-    }
-    return nullptr;
+    opts.markers = find_marker_format(format);
+    return opts.markers == nullptr ? nullptr : strdup(marker_content(song, opts).c_str());
 }

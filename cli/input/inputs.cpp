@@ -59,7 +59,7 @@ bool claim_target(input_supply &supply, input &entry, const std::string &target)
 
 bool claim_targets(input_supply &supply, input &entry) {
     const options &opts = supply.opts;
-    return (!writes_files(opts.format) ||
+    return (opts.markers == nullptr ||
             claim_target(supply, entry, marker_path(entry.path, opts))) &&
            (opts.clip.empty() || claim_target(supply, entry, clip_path(entry.path, opts)));
 }

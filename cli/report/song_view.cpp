@@ -1,185 +1,198 @@
 #include "cli/report/song_view.h"
 
-#include <poll.h>
-
 #include <algorithm>
 #include <array>
+#include <climits>
 #include <cmath>
 #include <memory>
 #include <numeric>
 
 #include "cli/input/short_path.h"
-#include "highlight/search.h"
+#include "cli/system.h"
+#include "cli/write/file_names.h"
+#include "cli/write/markers.h"
+#include "cli/write/value_text.h"
 #include "include/tavo.h"
-#include "media_source/mtsrc.h"
 
 namespace {
 
 constexpr int32_t kBlockSamples = 4096;
-constexpr size_t kMaxBins = 16384;  // several per column, so that edges stay sharp
+constexpr size_t kColumns = 4000;    // of the time axis: sharp when zoomed, about 30 KB
+constexpr size_t kMostBins = 16384;  // several per column, so that edges stay sharp
+constexpr auto kHopMs = static_cast<double>(TAVO_LOUDNESS_HOP_MS);
+constexpr size_t kWindowHops = TAVO_LOUDNESS_WINDOW_MS / TAVO_LOUDNESS_HOP_MS;
 
-// Extents of equally long spans. The span doubles when the bins run out, because the duration that
-// a file states may be wrong.
-struct bins {
-    std::vector<extent> complete;
-    int64_t samples_per_bin = 1;
-    extent current;
-    int64_t current_samples = 0;
+// The lowest and the highest sample of a span.
+struct extent {
+    int16_t low = INT16_MAX;
+    int16_t high = INT16_MIN;
 };
 
-struct loudness_curve {
-    size_t hop = 0;            // samples
-    size_t filled = 0;         // samples of the hop that is not complete
-    double sum = 0.0;          // of their squares
-    size_t complete_hops = 0;  // since the start
-    std::array<double, TAVO_LOUDNESS_WINDOW_MS / TAVO_LOUDNESS_HOP_MS> hops{};  // the last sums
-    std::vector<float> values;
+struct sound {
+    int64_t samples = 0;
+    std::vector<extent> bins;  // of equally long spans
+    int64_t samples_per_bin = 1;
+    extent bin;  // the one that is not complete
+    int64_t bin_samples = 0;
+    std::vector<double> hops;  // sums of the squares of complete hops
+    double hop = 0.0;          // of the one that is not complete
+    int64_t hop_samples = 0;
 };
 
 extent merged(const extent &a, const extent &b) {
     return {std::min(a.low, b.low), std::max(a.high, b.high)};
 }
 
-void close_bin(bins &waveform) {
-    waveform.complete.push_back(waveform.current);
-    waveform.current_samples = 0;
-    if (waveform.complete.size() < kMaxBins) return;
-    for (size_t i = 0; i < kMaxBins / 2; ++i) {
-        waveform.complete[i] = merged(waveform.complete[2 * i], waveform.complete[2 * i + 1]);
+// Doubles the span of the bins when there are too many: the duration that a file states, which
+// could say how many there will be, may be wrong.
+void close_bin(sound &song) {
+    song.bins.push_back(song.bin);
+    song.bin = {};
+    song.bin_samples = 0;
+    if (song.bins.size() < kMostBins) return;
+    for (size_t i = 0; i < kMostBins / 2; ++i) {
+        song.bins[i] = merged(song.bins[2 * i], song.bins[2 * i + 1]);
     }
-    waveform.complete.resize(kMaxBins / 2);
-    waveform.samples_per_bin *= 2;
+    song.bins.resize(kMostBins / 2);
+    song.samples_per_bin *= 2;
 }
 
-void add_samples(bins &waveform, const int16_t *pcm, size_t count) {
-    for (size_t i = 0; i < count; ++i) {
-        const extent sample = {pcm[i], pcm[i]};
-        waveform.current =
-            waveform.current_samples == 0 ? sample : merged(waveform.current, sample);
-        if (++waveform.current_samples == waveform.samples_per_bin) close_bin(waveform);
-    }
-}
-
-// Appends a value for each window, by the formula of tavo_get_loudness. A window consists of whole
-// hops; the sum of squares is kept for each hop.
-void add_samples(loudness_curve &curve, const int16_t *pcm, size_t count) {
-    for (size_t i = 0; i < count; ++i) {
-        const double sample = pcm[i] / 32767.0;
-        curve.sum += sample * sample;
-        if (++curve.filled < curve.hop) continue;
-        std::rotate(curve.hops.begin(), curve.hops.begin() + 1, curve.hops.end());
-        curve.hops.back() = curve.sum;
-        curve.sum = 0.0;
-        curve.filled = 0;
-        if (++curve.complete_hops < curve.hops.size()) continue;
-        const double total = std::accumulate(curve.hops.begin(), curve.hops.end(), 0.0);
-        const auto samples = static_cast<double>(curve.hop * curve.hops.size());
-        curve.values.push_back(static_cast<float>(10.0 * std::log10(total / samples + 1.0)));
+void add_sample(sound &song, int16_t sample, int64_t samples_per_hop) {
+    const double level = sample / 32767.0;
+    ++song.samples;
+    song.bin = merged(song.bin, {sample, sample});
+    if (++song.bin_samples == song.samples_per_bin) close_bin(song);
+    song.hop += level * level;
+    if (++song.hop_samples == samples_per_hop) {
+        song.hops.push_back(song.hop);
+        song.hop = 0.0;
+        song.hop_samples = 0;
     }
 }
 
-bool stop_requested(int stop_fd) {
-    pollfd watched = {stop_fd, POLLIN, 0};
-    return poll(&watched, 1, 0) > 0;
-}
-
-struct sound {
-    bins waveform;
-    loudness_curve loudness;
-    int64_t samples = 0;
-};
-
-outcome read_source(mtsrc_ctx *source, int32_t rate, int stop_fd, sound &song) {
-    song.loudness.hop = static_cast<size_t>(rate) * TAVO_LOUDNESS_HOP_MS / 1000;
-    std::array<int16_t, kBlockSamples> block{};
-    for (int32_t code = 0; code == 0;) {
-        if (stop_requested(stop_fd)) return outcome::stopped;
-        mtsrc_frame frame = {block.data(), 0};
-        code = mtsrc_getstream(source, static_cast<int32_t>(sizeof(block)), &frame);
-        if (code < 0 || frame.size <= 0) break;
-        const auto count = static_cast<size_t>(frame.size) / sizeof(int16_t);
-        add_samples(song.waveform, block.data(), count);
-        add_samples(song.loudness, block.data(), count);
-        song.samples += static_cast<int64_t>(count);
-    }
-    if (song.waveform.current_samples > 0) {
-        song.waveform.complete.push_back(song.waveform.current);
-    }
-    return outcome::ok;
-}
-
-outcome read_file(const std::string &path, int32_t rate, int stop_fd, sound &song) {
+failure read_samples(const std::string &path, int64_t samples_per_hop, int stop_fd, sound &song) {
     const mtsrc_param param{path.c_str()};
     int32_t code = 0;
     const std::unique_ptr<mtsrc_ctx, decltype(&mtsrc_deinit)> source(mtsrc_init(&param, &code),
                                                                      mtsrc_deinit);
-    return source == nullptr ? outcome::failed : read_source(source.get(), rate, stop_fd, song);
-}
-
-// A column covers every bin that it overlaps.
-std::vector<extent> columns_of(const bins &waveform, double axis_samples, int columns) {
-    const double bins_per_column =
-        axis_samples / columns / static_cast<double>(waveform.samples_per_bin);
-    std::vector<extent> out;
-    for (int k = 0; k < columns; ++k) {
-        const auto first = static_cast<size_t>(k * bins_per_column);
-        if (first >= waveform.complete.size()) break;
-        const auto end = static_cast<size_t>(std::ceil((k + 1) * bins_per_column));
-        extent column = waveform.complete[first];
-        for (size_t i = first + 1; i < std::min(end, waveform.complete.size()); ++i) {
-            column = merged(column, waveform.complete[i]);
+    std::array<int16_t, kBlockSamples> block{};
+    while (source != nullptr && code == TAVO_OK) {
+        if (is_readable(stop_fd)) return {"The analysis was stopped."};
+        mtsrc_frame frame = {block.data(), 0};
+        code = mtsrc_getstream(source.get(), static_cast<int32_t>(sizeof block), &frame);
+        if (code < 0) break;
+        for (size_t i = 0; i < static_cast<size_t>(frame.size) / sizeof block[0]; ++i) {
+            add_sample(song, block[i], samples_per_hop);
         }
-        out.push_back(column);
     }
-    return out;
+    if (song.bin_samples > 0) song.bins.push_back(song.bin);
+    return song.samples > 0 ? failure()
+                            : failure{"The sound could not be read again for the page."};
 }
 
-void fill_view(const record &result, const sound &song, int columns, song_view &view) {
-    const int32_t rate = result.sample_rate;
-    view.read_ms = 1000.0 * static_cast<double>(song.samples) / rate;
-    view.length_ms = std::max(view.read_ms, static_cast<double>(result.hl_pos_ms));
+// The bins as columns of a time axis. A column covers every bin that it overlaps; there are none
+// after the last sample.
+std::vector<extent> columns_of(const sound &song, double axis_samples) {
+    const double bins_per_column =
+        axis_samples / kColumns / static_cast<double>(song.samples_per_bin);
+    std::vector<extent> columns;
+    for (size_t k = 0; k < kColumns; ++k) {
+        const auto first = static_cast<size_t>(static_cast<double>(k) * bins_per_column);
+        if (first >= song.bins.size()) break;
+        const auto end =
+            static_cast<size_t>(std::ceil(static_cast<double>(k + 1) * bins_per_column));
+        extent column = song.bins[first];
+        for (size_t i = first + 1; i < std::min(end, song.bins.size()); ++i) {
+            column = merged(column, song.bins[i]);
+        }
+        columns.push_back(column);
+    }
+    return columns;
+}
+
+result_json wave_of(const std::vector<extent> &columns) {
+    int peak = 1;
+    for (const extent &column : columns) peak = std::max({peak, -column.low, +column.high});
+    result_json wave = result_json::array();
+    for (const extent &column : columns) {
+        wave.push_back(std::lround(column.low * (127.0 / peak)));
+        wave.push_back(std::lround(column.high * (127.0 / peak)));
+    }
+    return wave;
+}
+
+// By the formula of tavo_get_loudness. A window consists of whole hops.
+std::vector<float> loudness_of(const sound &song, int64_t samples_per_hop) {
+    std::vector<float> values;
+    const auto samples = static_cast<double>(samples_per_hop) * kWindowHops;
+    for (size_t i = 0; i + kWindowHops <= song.hops.size(); ++i) {
+        const auto *first = song.hops.data() + i;
+        const double sum = std::accumulate(first, first + kWindowHops, 0.0);
+        values.push_back(static_cast<float>(10.0 * std::log10(sum / samples + 1.0)));
+    }
+    return values;
+}
+
+// The start and the end of the span in which a highlight can be found, in ms. loudness: the number
+// of values.
+result_json searched_span(const record &result, size_t loudness) {
+    const bool is_short = result.duration_ms / 1000 < TAVO_SHORT_SONG_S;
+    const double start = is_short ? 0.0 : TAVO_SEARCH_SKIP * kHopMs;
+    const double tail = is_short ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
+    // The last window that is searched may have its rise at its very end.
+    const double last = static_cast<double>(loudness) - tail;
+    const double end = last < 0.0 ? start : last * kHopMs + TAVO_LOUDNESS_WINDOW_MS;
+    return {player_ms(result, start), player_ms(result, std::max(start, end))};
+}
+
+void add_result(const record &result, result_json &view) {
+    if (result.has_highlight) {
+        view["hl_pos_ms"] = player_ms(result, result.hl_pos_ms);
+        if (!view["loudness"].empty()) {
+            view["searched_ms"] = searched_span(result, view["loudness"].size());
+        }
+        view["region_end_ms"] = player_ms(result, region_end_ms(result));
+        if (result.length_s > 0) view["hl_end_ms"] = view["region_end_ms"];
+        if (has_refinement(result)) view["hl_refined"] = is_refined(result);
+    }
+    if (!result.has_beats) return;
+    view["bpm"] = result.bpm;
+    view["beats_ms"] = result_json::array();
     for (const float beat : result.beats_ms) {
-        view.length_ms = std::max(view.length_ms, static_cast<double>(beat));
+        view["beats_ms"].push_back(player_ms(result, static_cast<double>(beat)));
     }
-    view.waveform = columns_of(song.waveform, view.length_ms * rate / 1000.0, columns);
-    for (const extent &column : view.waveform) {
-        view.peak = std::max(
-            {view.peak, -static_cast<int32_t>(column.low), static_cast<int32_t>(column.high)});
-    }
-    view.loudness = song.loudness.values;
-    double sum = 0.0;
-    for (const float value : view.loudness) sum += static_cast<double>(value);
-    if (!view.loudness.empty()) view.mean = sum / static_cast<double>(view.loudness.size());
 }
 
 }  // namespace
 
-outcome read_song_view(const record &result, int columns, int stop_fd, song_view &view,
-                       std::string &error) {
+failure read_song_view(const record &result, int stop_fd, result_json &view) {
+    const int32_t rate = result.sample_rate;
+    const int64_t samples_per_hop = int64_t{rate} * TAVO_LOUDNESS_HOP_MS / 1000;
     sound song;
     short_path opened =
         open_short_path(result.sound_path.empty() ? result.file : result.sound_path);
-    const outcome status = read_file(opened.path, result.sample_rate, stop_fd, song);
+    const failure failed = read_samples(opened.path, samples_per_hop, stop_fd, song);
     close_short_path(opened);
-    if (status == outcome::stopped) {
-        error = "The analysis was stopped.";
-        return status;
-    }
-    if (song.samples == 0) {
-        error = "The sound could not be read again for the page.";
-        return outcome::failed;
-    }
-    fill_view(result, song, columns, view);
-    return outcome::ok;
-}
+    if (failed) return failed;
 
-std::pair<double, double> searched_span(const record &result, const song_view &view) {
-    constexpr auto kHopMs = static_cast<double>(TAVO_LOUDNESS_HOP_MS);
-    constexpr auto kWindowMs = static_cast<double>(TAVO_LOUDNESS_WINDOW_MS);
-    const bool is_short = result.duration_ms / 1000 < kShortSongSeconds;
-    const double tail = is_short ? kShortSearchTail : kSearchTail;
-    const double start = is_short ? 0.0 : kSearchSkip * kHopMs;
-    // The last window that is searched may have its rise at its very end.
-    const double last = static_cast<double>(view.loudness.size()) - tail;
-    return {start, last < 0.0 ? start : std::max(start, last * kHopMs + kWindowMs)};
+    const double read_ms = 1000.0 * static_cast<double>(song.samples) / rate;
+    double length_ms = std::max(read_ms, static_cast<double>(result.hl_pos_ms));
+    for (const float beat : result.beats_ms) {
+        length_ms = std::max(length_ms, static_cast<double>(beat));
+    }
+    const std::vector<float> loudness = loudness_of(song, samples_per_hop);
+    const double sum = std::accumulate(loudness.begin(), loudness.end(), 0.0);
+    view = {{"name", as_utf8(base_name(result.file))},
+            {"mode", mode_word(result.mode)},
+            {"sample_rate", rate},
+            {"channels", result.channels},
+            {"duration_ms", result.duration_ms},
+            {"length_ms", player_ms(result, length_ms)},
+            {"sound_ms", -result.offset_ms},
+            {"read_ms", read_ms},
+            {"wave", wave_of(columns_of(song, length_ms * rate / 1000.0))},
+            {"loudness", loudness},
+            {"mean", loudness.empty() ? 0.0 : sum / static_cast<double>(loudness.size())}};
+    add_result(result, view);
+    return {};
 }

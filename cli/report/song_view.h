@@ -1,40 +1,21 @@
-// What the page of a song draws besides the result: waveform and loudness.
+// What song.js draws: a song's result, its waveform and its loudness, as JSON. In the page of
+// --report and in the page of web/.
 //
-// In: a record (record.h) and the file that it describes. Out: a song_view. After: report.h.
+// In: a record (record.h) and the file that it describes. Out: JSON. After: report.h.
 #ifndef TAVO_CLI_REPORT_SONG_VIEW_H
 #define TAVO_CLI_REPORT_SONG_VIEW_H
 
-#include <cstdint>
-#include <string>
-#include <utility>
-#include <vector>
-
+#include "cli/failure.h"
 #include "cli/run/record.h"
+#include "cli/write/json.h"
 
-// The lowest and the highest sample of a span.
-struct extent {
-    int16_t low = 0;
-    int16_t high = 0;
-};
-
-struct song_view {
-    double length_ms = 0.0;        // length of the time axis: covers the samples and the result
-    double read_ms = 0.0;          // length of the samples that could be read
-    std::vector<extent> waveform;  // one entry a column, from the start; fewer than the columns
-                                   // if the axis goes on after the last sample
-    std::vector<float> loudness;   // entry k covers 6 s from 2 k s on; empty below 6 s
-    double mean = 0.0;             // of loudness
-    int32_t peak = 0;              // greatest magnitude of a sample, 0 to 32768
-};
-
-// Reads result.file once, from its start, and keeps only the columns and 4 bytes per 2 s. A read
-// error ends the waveform there. columns: of the whole time axis. stop_fd: as for analyse.
-// Returns ok; failed or stopped with a sentence in error.
-outcome read_song_view(const record &result, int columns, int stop_fd, song_view &view,
-                       std::string &error);
-
-// The span in which an entry can be found as the highlight, start and end in ms. Needs a loudness
-// curve.
-std::pair<double, double> searched_span(const record &result, const song_view &view);
+// Reads the sound once, from its start to its end or to a read error. stop_fd: as for analyse.
+//
+// view receives, besides values of the result: "wave", the lowest and the highest sample of each of
+// at most 4000 columns in turn, on a scale of -127 to 127 of the song's own peak; "loudness", a
+// value for the 6 s from each 2 s on, and its "mean". All times are the player's; the first decoded
+// sample is at "sound_ms", which may be negative. The sound itself is left to the caller: "audio"
+// (a URL) or "embedded" (base64).
+failure read_song_view(const record &result, int stop_fd, result_json &view);
 
 #endif

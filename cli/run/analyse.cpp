@@ -192,17 +192,16 @@ record analyse(const std::string &path, const options &opts, int stop_fd, song_f
         return out;
     }
 
-    click_file click;
-    out.error = begin_click(click, opts.click, path, opts.force);
+    output_file click;
+    out.error = begin_click(click, opts, path).sentence;
     if (!out.error.empty()) return out;
 
     const int64_t before_ms = cpu_time_ms();
     analyse_opened(opts, stop_fd, song, out);
     out.cpu_ms = cpu_time_ms() - before_ms;
-    const std::string error = finish_click(click, out.status == outcome::ok);
-    if (!error.empty()) {
+    if (failure failed = finish_click(click, opts, out.status == outcome::ok)) {
         out.status = outcome::failed;
-        out.error = error;
+        out.error = failed.sentence;
     }
     return out;
 }

@@ -30,7 +30,7 @@ void note_index_failure(ordered_output &output, const failure &failed) {
 
 void write_reply(ordered_output &output, const reply &answer) {
     if (answer.status == outcome::stopped) return;
-    note_index_failure(output, {add_report_row(output.index, answer.row)});
+    note_index_failure(output, add_report_row(output.index, answer.row));
     if (answer.status == outcome::failed) output.a_file_failed = true;
     write_result(output, answer.result);
     if (!output_failed(output)) write_message(output, answer.message);
@@ -39,7 +39,7 @@ void write_reply(ordered_output &output, const reply &answer) {
 }  // namespace
 
 failure start_output(ordered_output &output, const options &opts) {
-    if (failure failed = {begin_report_index(output.index, opts)}) return failed;
+    if (failure failed = begin_report_index(output.index, opts)) return failed;
     struct stat info {};
     output.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
     output.bar = start_progress(opts.quiet);
@@ -70,7 +70,7 @@ bool output_failed(const ordered_output &output) {
 
 int finish_output(ordered_output &output, const options &opts, bool has_other_error) {
     clear_progress(output.bar);
-    note_index_failure(output, {finish_report_index(output.index, opts)});
+    note_index_failure(output, finish_report_index(output.index, opts));
     if (output.write_error != 0) {
         write_message(
             output,

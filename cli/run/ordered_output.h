@@ -22,8 +22,8 @@ struct ordered_output {
     bool a_file_failed = false;
     bool reader_gone = false;  // standard output was closed by its reader
     int write_error = 0;       // errno of any other failure on standard output
-    report_index index;
-    bool to_pipe = false;  // standard output is a pipe, whose reader may end
+    output_file index;         // of the pages
+    bool to_pipe = false;      // standard output is a pipe, whose reader may end
     progress bar;
 };
 

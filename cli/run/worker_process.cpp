@@ -18,6 +18,7 @@
 #include "cli/write/clip.h"
 #include "cli/write/file_names.h"
 #include "cli/write/format.h"
+#include "cli/write/json.h"
 #include "cli/write/markers.h"
 #include "cli/write/output_file.h"
 
@@ -59,16 +60,14 @@ bool has_content(const std::string &path, const std::string &content) {
     return file && there == content;
 }
 
-void write_markers(record &result, const options &opts, const std::string &target) {
+failure write_markers(record &result, const options &opts, const std::string &target) {
     const std::string content = marker_content(result, opts);
     // A command that was killed before it committed the row has left the file.
-    const bool is_written = is_stored(opts) && has_content(target, content);
-    const failure failed = {is_written ? "" : write_file(target, content, opts.force)};
-    if (failed) {
-        result = failed_record(result.file, result.mode, failed.sentence);
-    } else {
-        result.written = target;
+    if (!is_stored(opts) || !has_content(target, content)) {
+        if (failure failed = write_file(target, content, opts.force)) return failed;
     }
+    result.written = target;
+    return {};
 }
 
 // The files that are written besides the result. A path is empty if the file was not asked for.
@@ -81,7 +80,7 @@ struct side_files {
 side_files find_side_files(const request &message, const options &opts) {
     side_files out;
     if (!opts.report.empty()) out.page = report_page_path(opts, message.index, message.path);
-    if (writes_files(opts.format)) out.markers = marker_path(message.path, opts);
+    if (opts.markers != nullptr) out.markers = marker_path(message.path, opts);
     if (!opts.clip.empty()) out.clip = clip_path(message.path, opts);
     return out;
 }
@@ -89,11 +88,11 @@ side_files find_side_files(const request &message, const options &opts) {
 // Checks before the analysis that the files can be written.
 failure check_side_files(const side_files &files, const options &opts) {
     failure failed;
-    if (!files.page.empty()) failed = {check_report(files.page, opts.force)};
+    if (!files.page.empty()) failed = check_report(files.page, opts.force);
     // With a store an existing file may be this song's: write_markers compares.
     const bool may_exist = opts.force || is_stored(opts);
-    if (!failed && !files.markers.empty()) failed = {check_target(files.markers, may_exist)};
-    if (!failed && !files.clip.empty()) failed = {check_target(files.clip, opts.force)};
+    if (!failed && !files.markers.empty()) failed = check_target(files.markers, may_exist);
+    if (!failed && !files.clip.empty()) failed = check_target(files.clip, opts.force);
     return failed;
 }
 
@@ -108,18 +107,25 @@ reply analyse_and_write(const request &message, const options &opts, int stop_fd
     song_file song;
     std::string row;
     record result = find_result(message, opts, stop_fd, song);
-    const bool is_analysed = result.status == outcome::ok;
-    const auto is_ok = [&result] { return result.status == outcome::ok; };
-    if (is_ok() && !files.page.empty()) {
-        write_report_page(result, opts, files.page, stop_fd, row);
+    failure failed;
+    if (result.status == outcome::ok) {
+        if (!files.page.empty()) {
+            failed = write_report_page(result, opts, files.page, stop_fd, row);
+        }
+        if (!failed && !files.markers.empty()) failed = write_markers(result, opts, files.markers);
+        if (!failed && !files.clip.empty()) {
+            failed = write_clip(result, opts, files.clip, stop_fd, song);
+        }
     }
-    if (is_ok() && !files.markers.empty()) write_markers(result, opts, files.markers);
-    if (is_ok() && !files.clip.empty()) write_clip(result, opts, files.clip, stop_fd, song);
     close_song(song);
+    if (failed) {
+        result = failed_record(message.path, opts.mode, failed.sentence);
+        if (is_readable(stop_fd)) result.status = outcome::stopped;
+    }
     reply out = make_reply(result, opts);
-    if (is_ok()) out.row = row;
+    if (result.status == outcome::ok) out.row = row;
     // The store does not record that only a file could not be written.
-    if (is_analysed && !is_ok()) out.json.clear();
+    if (failed) out.json.clear();
     return out;
 }
 
@@ -160,7 +166,7 @@ reply make_reply(const record &result, const options &opts) {
         if (opts.format == result_format::text) out.result = line;
     } else if (result.status == outcome::failed) {
         out.message = "tavo: " + line;
-        if (!opts.report.empty()) out.row = report_index_row(result, {}, "");
+        if (!opts.report.empty()) out.row = failed_report_row(result);
     }
     if (is_stored(opts) && result.status != outcome::stopped) out.json = json_record(result);
     return out;

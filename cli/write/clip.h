@@ -7,17 +7,18 @@
 
 #include <string>
 
+#include "cli/failure.h"
 #include "cli/input/song_file.h"
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// Where the clip of an input goes: to opts.clip, or to a name of its own in that folder, with the
-// ending of the input's kind of audio.
+// The clip of an input: opts.clip, or a file of its own in that folder, with the ending of the
+// input's kind of audio.
 std::string clip_path(const std::string &input, const options &opts);
 
 // Writes opts.length_s seconds from the highlight on, at the player's time, with opts.fade_s
-// seconds of fade at either end. What goes wrong is entered into result; target is then as before.
-void write_clip(record &result, const options &opts, const std::string &target, int stop_fd,
-                const song_file &song);
+// seconds of fade at either end. After a failure target is as before.
+failure write_clip(const record &result, const options &opts, const std::string &target,
+                   int stop_fd, const song_file &song);
 
 #endif

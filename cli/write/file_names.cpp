@@ -1,51 +1,55 @@
 #include "cli/write/file_names.h"
 
 #include <algorithm>
-#include <array>
+#include <cctype>
 #include <climits>
 #include <cstdint>
-#include <cstdio>
-#include <cstdlib>
 #include <cstring>
+#include <filesystem>
+#include <functional>
 #include <iterator>
-#include <memory>
+#include <string_view>
+
+#include "cli/write/value_text.h"
 
 namespace {
 
-constexpr const char *kHex = "0123456789ABCDEF";
+namespace fs = std::filesystem;
 
-uint8_t byte_at(const std::string &bytes, size_t i) {
-    return i < bytes.size() ? static_cast<uint8_t>(bytes[i]) : uint8_t{0};
-}
+constexpr const char *kReplacement = "\xEF\xBF\xBD";  // U+FFFD
 
-// Length of the character that starts at i, 0 when none does: no overlong forms, no surrogates,
-// nothing beyond U+10FFFF.
-size_t character_length(const std::string &bytes, size_t i) {
-    const uint8_t lead = byte_at(bytes, i);
-    if (lead < 0x80) return 1;
-    const size_t length = lead < 0xC2 ? 0 : lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : lead < 0xF5 ? 4 : 0;
-    if (length == 0 || i + length > bytes.size()) return 0;
-    for (size_t k = 1; k < length; ++k) {
-        if ((byte_at(bytes, i + k) & 0xC0) != 0x80) return 0;
+// A character in UTF-8, or a byte that is not part of one.
+struct character {
+    std::string_view bytes;
+    uint32_t point = 0;
+    bool is_valid = false;
+};
+
+// The character at the start of text. Overlong forms and surrogates are not valid.
+character first_character(std::string_view text) {
+    constexpr uint32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};  // by length
+    const auto lead = static_cast<uint8_t>(text[0]);
+    if (lead < 0x80) return {text.substr(0, 1), lead, true};
+    const size_t length = lead < 0xC2 ? 1 : lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : lead < 0xF5 ? 4 : 1;
+    const std::string_view bytes = text.substr(0, length);
+    uint32_t point = lead & (0xFFu >> (length + 1));
+    bool is_valid = length > 1 && bytes.size() == length;
+    for (const char byte : bytes.substr(1)) {
+        is_valid = is_valid && (byte & 0xC0) == 0x80;
+        point = point << 6 | (byte & 0x3Fu);
     }
-    const uint8_t second = byte_at(bytes, i + 1);
-    if (lead == 0xE0 && second < 0xA0) return 0;
-    if (lead == 0xED && second >= 0xA0) return 0;
-    if (lead == 0xF0 && second < 0x90) return 0;
-    if (lead == 0xF4 && second >= 0x90) return 0;
-    return length;
+    const bool is_surrogate = point >= 0xD800 && point <= 0xDFFF;
+    is_valid = is_valid && point >= kLeast[length] && point <= 0x10FFFF && !is_surrogate;
+    return is_valid ? character{bytes, point, true} : character{text.substr(0, 1)};
 }
 
-void add_hex(std::string &out, const char *before, uint8_t byte) {
-    out += before;
-    out += kHex[byte >> 4];
-    out += kHex[byte & 15];
-}
-
-uint32_t code_point(const std::string &bytes, size_t i, size_t length) {
-    uint32_t point = byte_at(bytes, i) & (length == 1 ? 0x7Fu : 0xFFu >> (length + 1));
-    for (size_t k = 1; k < length; ++k) point = point << 6 | (byte_at(bytes, i + k) & 0x3Fu);
-    return point;
+void for_each_character(std::string_view text,
+                        const std::function<void(const character &)> &visit) {
+    while (!text.empty()) {
+        const character first = first_character(text);
+        visit(first);
+        text.remove_prefix(first.bytes.size());
+    }
 }
 
 // Characters that move the cursor or reorder the text of a terminal: control characters, line
@@ -71,102 +75,108 @@ uint32_t hash_of(const std::string &bytes) {
 }  // namespace
 
 bool is_utf8(const std::string &bytes) {
-    for (size_t i = 0; i < bytes.size();) {
-        const size_t length = character_length(bytes, i);
-        if (length == 0) return false;
-        i += length;
-    }
-    return true;
+    bool is_valid = true;
+    for_each_character(bytes, [&](const character &each) { is_valid &= each.is_valid; });
+    return is_valid;
 }
 
 std::string shown(const std::string &bytes) {
     std::string out;
-    for (size_t i = 0; i < bytes.size();) {
-        const size_t length = character_length(bytes, i);
-        const uint8_t byte = byte_at(bytes, i);
-        if (byte == '\n') {
+    for_each_character(bytes, [&](const character &each) {
+        if (each.bytes == "\n") {
             out += "\\n";
-        } else if (byte == '\t') {
+        } else if (each.bytes == "\t") {
             out += "\\t";
-        } else if (byte == '\\') {
+        } else if (each.bytes == "\\") {
             out += "\\\\";
-        } else if (length == 0 || is_control(code_point(bytes, i, length))) {
-            for (size_t k = 0; k < std::max<size_t>(length, 1); ++k) {
-                add_hex(out, "\\x", byte_at(bytes, i + k));
-            }
+        } else if (each.is_valid && !is_control(each.point)) {
+            out += each.bytes;
         } else {
-            out.append(bytes, i, length);
+            for (const char byte : each.bytes) out += formatted("\\x%02X", byte & 0xFF);
         }
-        i += length == 0 ? 1 : length;
-    }
+    });
     return out;
 }
 
 std::string json_text(const std::string &utf8) {
     std::string out;
-    for (size_t i = 0; i < utf8.size();) {
-        const size_t length = std::max<size_t>(character_length(utf8, i), 1);
-        const uint32_t point = code_point(utf8, i, length);
-        if (is_control(point)) {
-            add_hex(out, "\\u", static_cast<uint8_t>(point >> 8));
-            add_hex(out, "", static_cast<uint8_t>(point & 0xFF));
+    for_each_character(utf8, [&](const character &each) {
+        if (is_control(each.point)) {
+            out += formatted("\\u%04X", each.point);
         } else {
-            out.append(utf8, i, length);
+            out += each.bytes;
         }
-        i += length;
-    }
+    });
     return out;
 }
 
 std::string as_utf8(const std::string &bytes) {
     std::string out;
-    for (size_t i = 0; i < bytes.size();) {
-        const size_t length = character_length(bytes, i);
-        if (length == 0) {
-            out += "\xEF\xBF\xBD";
-            ++i;
-        } else {
-            out.append(bytes, i, length);
-            i += length;
+    for_each_character(
+        bytes, [&](const character &each) { out += each.is_valid ? each.bytes : kReplacement; });
+    return out;
+}
+
+std::string html_text(const std::string &bytes) {
+    std::string out;
+    for (const char c : as_utf8(bytes)) {
+        switch (c) {
+            case '&':
+                out += "&amp;";
+                break;
+            case '<':
+                out += "&lt;";
+                break;
+            case '>':
+                out += "&gt;";
+                break;
+            case '"':
+                out += "&quot;";
+                break;
+            default:
+                out += c;
         }
     }
     return out;
+}
+
+std::string xml_text(const std::string &bytes) {
+    std::string allowed;
+    for_each_character(bytes, [&](const character &each) {
+        const bool is_allowed = each.point >= 0x20 && each.point != 0xFFFE && each.point != 0xFFFF;
+        allowed += is_allowed ? each.bytes : kReplacement;
+    });
+    return html_text(allowed);
 }
 
 std::string percent_encoded(const std::string &bytes) {
     std::string out;
     for (const char c : bytes) {
-        const bool plain = (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
-                           (c >= '0' && c <= '9') || (c != '\0' && strchr("-._~/", c) != nullptr);
-        if (plain) {
-            out += c;
-        } else {
-            add_hex(out, "%", static_cast<uint8_t>(c));
-        }
+        const bool is_plain =
+            (c & 0x80) == 0 && c != '\0' && (isalnum(c) != 0 || strchr("-._~/", c) != nullptr);
+        out += is_plain ? std::string(1, c) : formatted("%%%02X", c & 0xFF);
     }
     return out;
 }
 
 std::string base_name(const std::string &path) {
-    const size_t slash = path.rfind('/');
-    return slash == std::string::npos ? path : path.substr(slash + 1);
+    return fs::path(path).filename();
 }
 
 std::string stem(const std::string &name) {
-    const size_t period = name.rfind('.');
-    return period == 0 ? name : name.substr(0, period);
+    return fs::path(name).stem();
 }
 
 std::string file_url(const std::string &path) {
-    const std::unique_ptr<char, decltype(&free)> whole(realpath(path.c_str(), nullptr), free);
-    return "file://" + percent_encoded(whole == nullptr ? path : whole.get());
+    std::error_code failed;
+    const fs::path absolute = fs::canonical(path, failed);
+    return "file://" + percent_encoded(failed ? path : absolute.string());
 }
 
 std::string fitting_name(const std::string &name, const std::string &suffix) {
     if (name.size() + suffix.size() <= NAME_MAX) return name + suffix;
-    std::array<char, 16> number{};
-    snprintf(number.data(), number.size(), "~%08x", hash_of(name));
-    size_t kept = NAME_MAX - suffix.size() - 9;
-    while (kept > 0 && (static_cast<uint8_t>(name[kept]) & 0xC0) == 0x80) --kept;  // in a character
-    return name.substr(0, kept) + number.data() + suffix;
+    const std::string number = formatted("~%08x", hash_of(name));
+    size_t kept = NAME_MAX - suffix.size() - number.size();
+    while (kept > 0 && (name[kept] & 0xC0) == 0x80) --kept;  // not inside a character
+    return name.substr(0, kept) + number + suffix;
 }

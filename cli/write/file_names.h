@@ -1,4 +1,4 @@
-// File names are bytes. These functions turn them into text for people, for JSON and for URLs.
+// File names are bytes. These functions turn them into text for people, for JSON, XML and URLs.
 #ifndef TAVO_CLI_WRITE_FILE_NAMES_H
 #define TAVO_CLI_WRITE_FILE_NAMES_H
 
@@ -15,6 +15,10 @@ std::string json_text(const std::string &utf8);
 
 // Valid UTF-8: each byte that is not part of a character becomes U+FFFD.
 std::string as_utf8(const std::string &bytes);
+
+// The same with & < > and " as entities; in XML the characters that it forbids are U+FFFD too.
+std::string html_text(const std::string &bytes);
+std::string xml_text(const std::string &bytes);
 
 // Every byte outside A-Z a-z 0-9 - . _ ~ / as %NN.
 std::string percent_encoded(const std::string &bytes);

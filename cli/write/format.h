@@ -18,12 +18,6 @@ std::string format_record(const options &opts, const record &result);
 // for an unknown field.
 failure fill_template(const std::string &text, const record &result, std::string &filled);
 
-std::string text_record(const record &result);
-std::string json_record(const record &result);
-
-// The record that json_record made the text of, except the file's name. Throws std::exception for
-// any other text.
-record record_from_json(const std::string &text);
 std::string csv_head();
 std::string csv_record(const record &result);
 

@@ -2,17 +2,22 @@
 
 #include <array>
 #include <charconv>
-#include <cmath>
 
 #include "cli/write/file_names.h"
 #include "cli/write/format.h"
-#include "cli/write/value_text.h"
+#include "cli/write/json.h"
 
 namespace {
 
+// In the order of the columns: keys of json_object.
+constexpr const char *kColumns[] = {"file",      "mode",        "status",    "sample_rate",
+                                    "channels",  "duration_ms", "offset_ms", "hl_pos_ms",
+                                    "hl_end_ms", "hl_refined",  "bpm",       "beat_count",
+                                    "beats_ms",  "cpu_ms",      "error"};
+
 // Quoted where the cell needs it. Names go out byte for byte, whatever their encoding, except to a
 // terminal. Programs read this format: a name that begins with = + - @ stays as it is.
-std::string cell(const std::string &text) {
+std::string quoted(const std::string &text) {
     const std::string value = isatty(STDOUT_FILENO) == 1 ? shown(text) : text;
     if (value.find_first_of(",\"\r\n") == std::string::npos) return value;
     std::string out = "\"";
@@ -31,39 +36,30 @@ std::string number_text(float value) {
     return std::string(text.data(), end.ptr);
 }
 
-std::string spaced(const std::vector<float> &times) {
-    std::string out;
-    for (const float time : times) out += (out.empty() ? "" : " ") + number_text(time);
-    return out;
+std::string cell(const result_json &value) {
+    if (value.is_string()) return quoted(value.get<std::string>());
+    if (value.is_number_float()) return number_text(value.get<float>());
+    if (!value.is_array()) return value.dump();
+    std::string numbers;
+    for (const result_json &item : value) numbers += (numbers.empty() ? "" : " ") + cell(item);
+    return numbers;
 }
 
 }  // namespace
 
 std::string csv_head() {
-    return "file,mode,status,sample_rate,channels,duration_ms,offset_ms,hl_pos_ms,hl_end_ms,hl_"
-           "refined,bpm,"
-           "beat_count,beats_ms,cpu_ms,error\n";
+    std::string row;
+    for (const char *name : kColumns) row += (row.empty() ? "" : ",") + std::string(name);
+    return row + "\n";
 }
 
 std::string csv_record(const record &result) {
-    const auto when = [](bool known, int64_t value) {
-        return known ? std::to_string(value) : std::string();
-    };
-    std::string row = cell(result.file);
-    row += std::string(",") + mode_word(result.mode) + "," + status_word(result.status);
-    row += "," + when(result.has_stream, result.sample_rate);
-    row += "," + when(result.has_stream, result.channels);
-    row += "," + when(result.has_stream, result.duration_ms);
-    row += "," + (result.has_stream ? number_text(static_cast<float>(result.offset_ms)) : "");
-    row += "," + when(result.has_highlight, result.hl_pos_ms);
-    row += "," + when(result.has_highlight && result.length_s > 0,
-                      std::llround(highlight_end_ms(result, result.length_s)));
-    row += ",";
-    if (has_refinement(result)) row += is_refined(result) ? "true" : "false";
-    row += "," + when(result.has_beats, result.bpm);
-    row += "," + when(result.has_beats, static_cast<int64_t>(result.beats_ms.size()));
-    row += "," + spaced(result.beats_ms);
-    row += "," + when(result.cpu_ms >= 0, result.cpu_ms);
-    row += "," + cell(result.error);
+    result_json object = json_object(result);
+    object["file"] = result.file;  // its exact bytes
+    std::string row;
+    for (const char *name : kColumns) {
+        if (name != kColumns[0]) row += ",";
+        if (object.contains(name)) row += cell(object[name]);
+    }
     return row + "\n";
 }

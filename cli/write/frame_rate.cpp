@@ -1,8 +1,8 @@
 #include "cli/write/frame_rate.h"
 
-#include <array>
 #include <cmath>
-#include <cstdio>
+
+#include "cli/write/value_text.h"
 
 namespace {
 
@@ -54,9 +54,7 @@ int64_t frame_at(double ms, const frame_rate &rate) {
 std::string timecode(int64_t frame, const frame_rate &rate) {
     const int64_t number = number_of(frame, rate);
     const auto seconds = static_cast<long long>(number / rate.base);
-    std::array<char, 48> text{};
-    snprintf(text.data(), text.size(), "%02lld:%02lld:%02lld%c%02lld", seconds / 3600,
-             seconds / 60 % 60, seconds % 60, rate.drop ? ';' : ':',
-             static_cast<long long>(number % rate.base));
-    return text.data();
+    return formatted("%02lld:%02lld:%02lld%c%02lld", seconds / 3600, seconds / 60 % 60,
+                     seconds % 60, rate.drop ? ';' : ':',
+                     static_cast<long long>(number % rate.base));
 }

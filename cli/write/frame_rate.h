@@ -14,7 +14,7 @@ struct frame_rate {
     bool drop;     // the timecode leaves out frame numbers, so that it keeps up with the clock
 };
 
-// Null when there is no such rate.
+// Returns null for another name.
 const frame_rate *find_frame_rate(const std::string &name);
 
 // Their names, in order.

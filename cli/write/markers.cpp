@@ -1,41 +1,32 @@
 #include "cli/write/markers.h"
 
-#include <array>
-#include <climits>
-#include <cstdio>
-
 #include "cli/write/file_names.h"
 
 namespace {
 
-struct marker_format {
-    result_format format;
-    const char *suffix;  // of the file's name, after the song's
-    std::string (*content)(const record &result, const options &opts);
-};
-constexpr marker_format kMarkerFormats[] = {
-    {result_format::labels, ".labels.txt", audacity_labels},
-    {result_format::kdenlive, ".guides.txt", kdenlive_guides},
-    {result_format::llc, "-proj.llc", losslesscut_project},
-    {result_format::ffmetadata, ".ffmetadata.txt", ffmetadata_chapters},
-    {result_format::edl, ".edl", edl_markers},
-    {result_format::fcpxml, ".fcpxml", fcpxml_markers},
-    {result_format::otio, ".otio", otio_timeline},
-    {result_format::reaper, ".reaper.csv", reaper_markers},
-};
 constexpr int32_t kUsualLengthSeconds = 30;  // marked without --length: a preview's
-
-const marker_format *find_format(result_format format) {
-    for (const marker_format &entry : kMarkerFormats) {
-        if (entry.format == format) return &entry;
-    }
-    return nullptr;
-}
 
 }  // namespace
 
-bool writes_files(result_format format) {
-    return find_format(format) != nullptr;
+const std::vector<marker_format> &marker_formats() {
+    static const std::vector<marker_format> formats = {
+        {"labels", ".labels.txt", false, false, audacity_labels},
+        {"kdenlive", ".guides.txt", false, false, kdenlive_guides},
+        {"llc", "-proj.llc", true, false, losslesscut_project},  // found by the song's stem
+        {"ffmetadata", ".ffmetadata.txt", false, false, ffmetadata_chapters},
+        {"edl", ".edl", false, true, edl_markers},
+        {"fcpxml", ".fcpxml", false, true, fcpxml_markers},
+        {"otio", ".otio", false, true, otio_timeline},
+        {"reaper", ".reaper.csv", false, false, reaper_markers},
+    };
+    return formats;
+}
+
+const marker_format *find_marker_format(const std::string &word) {
+    for (const marker_format &format : marker_formats()) {
+        if (format.word == word) return &format;
+    }
+    return nullptr;
 }
 
 std::string marker_path(const std::string &input, const options &opts) {
@@ -43,13 +34,12 @@ std::string marker_path(const std::string &input, const options &opts) {
     const std::string folder = opts.output_dir.empty()
                                    ? input.substr(0, input.size() - name.size())
                                    : opts.output_dir + (opts.output_dir.back() == '/' ? "" : "/");
-    // LosslessCut finds a project by the song's name without its ending.
-    const std::string song = opts.format == result_format::llc ? stem(name) : name;
-    return folder + fitting_name(song, find_format(opts.format)->suffix);
+    return folder +
+           fitting_name(opts.markers->drops_ending ? stem(name) : name, opts.markers->suffix);
 }
 
 std::string marker_content(const record &result, const options &opts) {
-    return find_format(opts.format)->content(result, opts);
+    return opts.markers->content(result, *find_frame_rate(opts.fps));
 }
 
 double region_end_ms(const record &result) {

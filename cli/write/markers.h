@@ -9,6 +9,7 @@
 
 #include "cli/options.h"
 #include "cli/run/record.h"
+#include "cli/write/frame_rate.h"
 
 // The highlight, from its start to its end, or a beat, whose times are equal. Milliseconds as
 // players count them.
@@ -18,14 +19,25 @@ struct mark {
     std::string name;
 };
 
-// Where the highlight's region ends: after --length, or after what a preview usually lasts.
-double region_end_ms(const record &result);
-
 // All marks of a song, the highlight first.
 std::vector<mark> marks_of(const record &result);
 
-// True if the format writes a file for each input.
-bool writes_files(result_format format);
+// The end of the highlight's region: after --length, or after what a preview usually lasts.
+double region_end_ms(const record &result);
+
+struct marker_format {
+    const char *word;    // of --format
+    const char *suffix;  // of the file's name, after the song's
+    bool drops_ending;   // the song's name loses its ending first
+    bool counts_frames;  // --fps applies
+    std::string (*content)(const record &result, const frame_rate &rate);
+};
+
+// In the order of the help.
+const std::vector<marker_format> &marker_formats();
+
+// Returns null for another word.
+const marker_format *find_marker_format(const std::string &word);
 
 // The marker file of an input. A name too long for a file system is cut and numbered.
 std::string marker_path(const std::string &input, const options &opts);
@@ -34,13 +46,13 @@ std::string marker_path(const std::string &input, const options &opts);
 std::string marker_content(const record &result, const options &opts);
 
 // The writers.
-std::string audacity_labels(const record &result, const options &opts);
-std::string kdenlive_guides(const record &result, const options &opts);
-std::string losslesscut_project(const record &result, const options &opts);
-std::string reaper_markers(const record &result, const options &opts);
-std::string ffmetadata_chapters(const record &result, const options &opts);
-std::string edl_markers(const record &result, const options &opts);
-std::string fcpxml_markers(const record &result, const options &opts);
-std::string otio_timeline(const record &result, const options &opts);
+std::string audacity_labels(const record &result, const frame_rate &rate);
+std::string kdenlive_guides(const record &result, const frame_rate &rate);
+std::string losslesscut_project(const record &result, const frame_rate &rate);
+std::string ffmetadata_chapters(const record &result, const frame_rate &rate);
+std::string edl_markers(const record &result, const frame_rate &rate);
+std::string fcpxml_markers(const record &result, const frame_rate &rate);
+std::string otio_timeline(const record &result, const frame_rate &rate);
+std::string reaper_markers(const record &result, const frame_rate &rate);
 
 #endif

@@ -1,12 +1,25 @@
 // Final Cut Pro's XML, version 1.8: a project with the song as its only clip, and markers on it.
 #include <algorithm>
+#include <utility>
 
 #include "cli/write/file_names.h"
 #include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
-#include "cli/write/xml.h"
 
 namespace {
+
+typedef std::vector<std::pair<const char *, std::string>> attributes;  // values already escaped
+
+// A start tag without its closing bracket.
+std::string opened(const char *name, const attributes &values) {
+    std::string out = std::string("<") + name;
+    for (const auto &[key, value] : values) out += std::string(" ") + key + "=\"" + value + "\"";
+    return out;
+}
+
+std::string element(const char *name, const attributes &values) {
+    return opened(name, values) + "/>\n";
+}
 
 // A whole number of frames as a fraction of seconds.
 std::string frames_text(int64_t frames, const frame_rate &rate) {
@@ -15,9 +28,8 @@ std::string frames_text(int64_t frames, const frame_rate &rate) {
 
 }  // namespace
 
-std::string fcpxml_markers(const record &result, const options &opts) {
-    const frame_rate &rate = *find_frame_rate(opts.fps);
-    const std::string name = xml_attribute(base_name(result.file));
+std::string fcpxml_markers(const record &result, const frame_rate &rate) {
+    const std::string name = xml_text(base_name(result.file));
     const std::string frame = frames_text(1, rate);
     const std::string length = frames_text(
         std::max<int64_t>(1, frame_at(static_cast<double>(result.duration_ms), rate)), rate);

@@ -4,6 +4,8 @@
 
 #include <string>
 
+#include "cli/failure.h"
+
 // A temporary file in the folder of the target, with the permissions of a new file.
 struct output_file {
     std::string target;
@@ -14,24 +16,21 @@ struct output_file {
 // True if both paths lead to one existing file.
 bool same_file(const std::string &a, const std::string &b);
 
-// These return an empty string or a sentence that says what failed.
-
 // Checks that the target can be written: its folder is writable and, without force, the target
 // does not exist. Creates nothing.
-std::string check_target(const std::string &target, bool force);
+failure check_target(const std::string &target, bool force);
 
 // ending: of the temporary file's name, for programs that go by it.
-std::string begin_output(output_file &file, const std::string &target,
-                         const std::string &ending = "");
-std::string write_output(output_file &file, const std::string &content);
+failure begin_output(output_file &file, const std::string &target, const std::string &ending = "");
+failure write_output(output_file &file, const std::string &content);
 
 // Gives the file its name. Without force an existing target stays and the temporary is removed.
-std::string commit_output(output_file &file, bool force);
+failure commit_output(output_file &file, bool force);
 
 // Removes what is left. Harmless after a commit and when called twice.
 void abandon_output(output_file &file);
 
 // All of the above.
-std::string write_file(const std::string &target, const std::string &content, bool force);
+failure write_file(const std::string &target, const std::string &content, bool force);
 
 #endif

@@ -3,53 +3,48 @@
 #include <array>
 #include <cctype>
 #include <cmath>
+#include <cstdarg>
 #include <cstdio>
 #include <system_error>
 
 #include "include/tavo.h"
 
-const char *mode_word(int32_t mode) {
-    switch (mode) {
-        case TAVO_MODE_HIGHLIGHT:
-            return "highlight";
-        case TAVO_MODE_BEATS:
-            return "beats";
-        default:
-            return "both";
-    }
-}
-
-int32_t mode_of(const std::string &word) {
-    if (word == "highlight") return TAVO_MODE_HIGHLIGHT;
-    return word == "beats" ? TAVO_MODE_BEATS : TAVO_MODE_BOTH;
-}
-
-const char *status_word(outcome status) {
-    switch (status) {
-        case outcome::ok:
-            return "ok";
-        case outcome::failed:
-            return "failed";
-        case outcome::stopped:
-            return "stopped";
-    }
-    return "failed";
-}
-
 namespace {
 
-std::string seconds_text(long long whole) {
-    std::array<char, 48> text{};
-    if (whole >= 3600) {
-        snprintf(text.data(), text.size(), "%lld:%02lld:%02lld", whole / 3600, whole / 60 % 60,
-                 whole % 60);
-    } else {
-        snprintf(text.data(), text.size(), "%lld:%02lld", whole / 60, whole % 60);
-    }
-    return text.data();
+constexpr const char *kModeWords[] = {"highlight", "beats", "both"};  // by TAVO_MODE_*
+constexpr const char *kStatusWords[] = {"ok", "failed", "stopped"};   // by outcome
+
+std::string seconds_text(long long seconds) {
+    const long long hours = seconds / 3600;
+    return (hours > 0 ? formatted("%lld:%02lld", hours, seconds / 60 % 60)
+                      : std::to_string(seconds / 60)) +
+           formatted(":%02lld", seconds % 60);
 }
 
 }  // namespace
+
+std::string formatted(const char *format, ...) {
+    std::array<char, 96> text{};
+    va_list values;
+    va_start(values, format);
+    vsnprintf(text.data(), text.size(), format, values);
+    va_end(values);
+    return text.data();
+}
+
+const char *mode_word(int32_t mode) {
+    return kModeWords[mode];
+}
+
+int32_t mode_of(const std::string &word) {
+    int32_t mode = TAVO_MODE_HIGHLIGHT;
+    while (mode < TAVO_MODE_BOTH && word != kModeWords[mode]) ++mode;
+    return mode;
+}
+
+const char *status_word(outcome status) {
+    return kStatusWords[static_cast<int>(status)];
+}
 
 std::string whole_clock_text(double ms) {
     return seconds_text(std::llround(ms / 1000.0));

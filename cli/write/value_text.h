@@ -7,6 +7,9 @@
 
 #include "cli/run/record.h"
 
+// printf into a string of at most 95 characters.
+std::string formatted(const char *format, ...) __attribute__((format(printf, 1, 2)));
+
 // Words of the interface: highlight, beats, both; ok, failed, stopped.
 const char *mode_word(int32_t mode);
 int32_t mode_of(const std::string &word);  // TAVO_MODE_*; the words' inverse

@@ -1,13 +1,11 @@
+#include "cli/write/json.h"
+
 #include <cmath>
 
 #include "cli/write/file_names.h"
-#include "cli/write/format.h"
-#include "cli/write/json.h"
 #include "cli/write/value_text.h"
 
-// JSON cannot contain a name that is not UTF-8. file then has U+FFFD instead of the invalid bytes,
-// and file_bytes has the exact name, percent-encoded.
-std::string json_record(const record &result) {
+result_json json_object(const record &result) {
     result_json object;
     object["file"] = as_utf8(result.file);
     if (!is_utf8(result.file)) object["file_bytes"] = percent_encoded(result.file);
@@ -35,7 +33,11 @@ std::string json_record(const record &result) {
     }
     if (result.cpu_ms >= 0) object["cpu_ms"] = result.cpu_ms;
     if (!result.error.empty()) object["error"] = as_utf8(result.error);
-    return json_text(object.dump()) + "\n";
+    return object;
+}
+
+std::string json_record(const record &result) {
+    return json_text(json_object(result).dump()) + "\n";
 }
 
 record record_from_json(const std::string &text) {
