@@ -1,12 +1,10 @@
 #include "cli/store/database.h"
 
-#include <algorithm>
 #include <cctype>
+#include <regex>
 #include <set>
 
 namespace {
-
-constexpr const char *kDelimiters = ":/@?#&=%\"'(),; \n";
 
 bool starts_with(const std::string &text, const std::string &start) {
     return text.compare(0, start.size(), start) == 0;
@@ -14,16 +12,6 @@ bool starts_with(const std::string &text, const std::string &start) {
 
 bool ends_with(const std::string &text, const std::string &end) {
     return text.size() > end.size() && text.compare(text.size() - end.size(), end.size(), end) == 0;
-}
-
-// Calls on_word for each run of characters that are not delimiters, with its place in the text.
-void for_each_word(const std::string &text, const std::function<void(size_t, size_t)> &on_word) {
-    size_t start = text.find_first_not_of(kDelimiters);
-    while (start != std::string::npos) {
-        const size_t end = std::min(text.find_first_of(kDelimiters, start), text.size());
-        on_word(start, end - start);
-        start = text.find_first_not_of(kDelimiters, end);
-    }
 }
 
 std::string percent_decoded(const std::string &text) {
@@ -60,22 +48,22 @@ failure find_database(const std::string &url, const database_kind **kind, std::s
 }
 
 std::string without_credentials(const std::string &text, const std::string &url) {
+    static const std::regex word("[^:/@?#&=%\"'(),; \n]+");
     const size_t scheme = url.find("://");
     const size_t last_at = url.rfind('@');
     if (scheme == std::string::npos || last_at == std::string::npos || last_at < scheme) {
         return text;
     }
     const std::string credentials = url.substr(scheme + 3, last_at - scheme - 3);
-    std::set<std::string> secret;
-    for (const std::string &form : {credentials, percent_decoded(credentials)}) {
-        for_each_word(form, [&](size_t at, size_t size) { secret.insert(form.substr(at, size)); });
-    }
+    const std::string words = credentials + " " + percent_decoded(credentials);
+    const std::set<std::string> secret(std::sregex_token_iterator(words.begin(), words.end(), word),
+                                       std::sregex_token_iterator());
     std::string out;
-    size_t copied = 0;
-    for_each_word(text, [&](size_t at, size_t size) {
-        if (secret.count(text.substr(at, size)) == 0) return;
-        out += text.substr(copied, at - copied) + "***";
-        copied = at + size;
-    });
-    return out + text.substr(copied);
+    auto copied = text.begin();
+    for (std::sregex_iterator found(text.begin(), text.end(), word), end; found != end; ++found) {
+        if (secret.count(found->str()) == 0) continue;
+        out.append(copied, (*found)[0].first).append("***");
+        copied = (*found)[0].second;
+    }
+    return out.append(copied, text.end());
 }

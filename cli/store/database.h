@@ -22,17 +22,16 @@ using row = std::vector<cell>;
 struct database_kind {
     const char *bytes_type;  // SQL type names
     const char *time_type;
+    const char *time_now;  // SQL for the current second
     const char *json_type;
     size_t longest_path;  // bytes that an index can hold
 
-    // Selects the version of the store's table, 0 if it has none.
-    const char *version_query;
-    std::string (*set_version_statement)(int version);
-    // Begin a transaction that excludes other upgrades of the table.
-    const char *begin_upgrade[2];
+    const char *version_query;  // selects the version of the store's table, or 0 without a table
+    const char *set_version;    // printf format of the statement that sets it
+    const char *begin_upgrade;  // begins a transaction that excludes other upgrades of the table
 
-    // Failures have the database's own text. A damaged file, or a missing table or permission, is
-    // permanent.
+    // The handle must be closed even if open failed. Failures have the database's own text. A
+    // damaged file, or a missing table or permission, is permanent.
     failure (*open)(const std::string &location, bool read_only, void **handle);
     failure (*run)(void *handle, const std::string &sql, const row &values,
                    const std::function<void(const row &)> &on_row);

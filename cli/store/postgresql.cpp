@@ -33,44 +33,11 @@ bool is_permanent(const char *sql_state) {
 
 failure connect(const std::string &location, bool /*read_only*/, void **handle) {
     PGconn *connection = PQconnectdb(location.c_str());
-    if (PQstatus(connection) != CONNECTION_OK) {
-        failure failed = {sentence(PQerrorMessage(connection))};
-        PQfinish(connection);
-        return failed;
-    }
+    *handle = connection;
+    if (PQstatus(connection) != CONNECTION_OK) return {sentence(PQerrorMessage(connection))};
     PQsetNoticeProcessor(
         connection, [](void *, const char *) {}, nullptr);
-    *handle = connection;
     return {};
-}
-
-// Values in the form of the protocol: numbers and text as text, bytes unchanged.
-struct parameters {
-    std::vector<std::string> texts;
-    std::vector<const char *> values;
-    std::vector<int> lengths;
-    std::vector<int> formats;
-    std::vector<Oid> types;
-};
-
-parameters make_parameters(const row &values) {
-    parameters out;
-    out.texts.reserve(values.size());  // their addresses must not change
-    for (const cell &value : values) {
-        const auto *number = std::get_if<int64_t>(&value);
-        const auto *text = std::get_if<std::string>(&value);
-        const auto *blob = std::get_if<bytes>(&value);
-        out.texts.push_back(number != nullptr ? std::to_string(*number)
-                            : text != nullptr ? *text
-                            : blob != nullptr ? blob->value
-                                              : "");
-        const bool null = std::holds_alternative<std::monostate>(value);
-        out.values.push_back(null ? nullptr : out.texts.back().data());
-        out.lengths.push_back(static_cast<int>(out.texts.back().size()));
-        out.formats.push_back(blob != nullptr ? 1 : 0);
-        out.types.push_back(blob != nullptr ? kBytesOid : 0);
-    }
-    return out;
 }
 
 cell column(const PGresult *result, int line, int index) {
@@ -89,10 +56,29 @@ cell column(const PGresult *result, int line, int index) {
 failure run(void *handle, const std::string &sql, const row &values,
             const std::function<void(const row &)> &on_row) {
     auto *connection = static_cast<PGconn *>(handle);
-    const parameters given = make_parameters(values);
+    // In the form of the protocol: numbers and text as text, bytes unchanged.
+    std::vector<std::string> texts(values.size());
+    std::vector<const char *> data(values.size());
+    std::vector<int> sizes(values.size());
+    std::vector<int> formats(values.size());
+    std::vector<Oid> types(values.size());
+    for (size_t i = 0; i < values.size(); ++i) {
+        const auto *number = std::get_if<int64_t>(&values[i]);
+        const auto *text = std::get_if<std::string>(&values[i]);
+        const auto *blob = std::get_if<bytes>(&values[i]);
+        if (number != nullptr) texts[i] = std::to_string(*number);
+        if (text != nullptr) texts[i] = *text;
+        if (blob != nullptr) texts[i] = blob->value;
+        const bool is_null = std::holds_alternative<std::monostate>(values[i]);
+        data[i] = is_null ? nullptr : texts[i].data();
+        sizes[i] = static_cast<int>(texts[i].size());
+        formats[i] = blob != nullptr ? 1 : 0;
+        types[i] = blob != nullptr ? kBytesOid : 0;
+    }
     const std::unique_ptr<PGresult, decltype(&PQclear)> result(
-        PQexecParams(connection, sql.c_str(), static_cast<int>(values.size()), given.types.data(),
-                     given.values.data(), given.lengths.data(), given.formats.data(), 0),
+        values.empty() ? PQexec(connection, sql.c_str())
+                       : PQexecParams(connection, sql.c_str(), static_cast<int>(values.size()),
+                                      types.data(), data.data(), sizes.data(), formats.data(), 0),
         PQclear);
     const ExecStatusType status = PQresultStatus(result.get());
     if (status != PGRES_COMMAND_OK && status != PGRES_TUPLES_OK) {
@@ -113,20 +99,17 @@ void disconnect(void *handle) {
     PQfinish(static_cast<PGconn *>(handle));
 }
 
-std::string set_version_statement(int version) {
-    return "COMMENT ON TABLE songs IS 'tavo, version " + std::to_string(version) + "'";
-}
-
 // An index entry can have a third of a page of 8 KiB.
 constexpr database_kind kPostgresql = {
     "BYTEA",
     "TIMESTAMPTZ",
+    "date_trunc('second', now())",
     "JSON",
     2600,
     "SELECT coalesce(substring(obj_description(to_regclass('songs'), 'pg_class') FROM "
     "'version ([0-9]+)'), '0')::int",
-    set_version_statement,
-    {"BEGIN", "SELECT pg_advisory_xact_lock(hashtext('tavo songs'))"},
+    "COMMENT ON TABLE songs IS 'tavo, version %d'",
+    "BEGIN; SELECT pg_advisory_xact_lock(hashtext('tavo songs'))",
     connect,
     run,
     disconnect};

@@ -4,49 +4,44 @@
 
 #include <algorithm>
 #include <array>
-#include <ctime>
 #include <nlohmann/json.hpp>
 
 #include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 
 namespace {
 
 using nlohmann::json;
 
+enum class column_type { text, whole, real, list };  // list: of numbers, as JSON
+
 // A column with a part of the result, and the part's key in JSON.
 struct result_column {
     const char *name;
-    const char *type;  // null: the database's type for JSON
     const char *key;
-    int version;  // first version of the table with this column
+    column_type type;
+    const char *sql;  // its declaration; null: the database's type for JSON
+    int version;      // first version of the table with this column
 };
 constexpr result_column kResultColumns[] = {
-    {"status", "TEXT NOT NULL", "status", 1},
-    {"sentence", "TEXT", "error", 1},
-    {"sample_rate", "INTEGER", "sample_rate", 1},
-    {"channels", "INTEGER", "channels", 1},
-    {"duration_ms", "BIGINT", "duration_ms", 1},
-    {"hl_pos_ms", "INTEGER", "hl_pos_ms", 1},
-    {"hl_end_ms", "BIGINT", "hl_end_ms", 1},
-    {"hl_refined", "INTEGER", "hl_refined", 1},
-    {"bpm", "INTEGER", "bpm", 1},
-    {"beats_ms", nullptr, "beats_ms", 1},
-    {"cpu_ms", "BIGINT", "cpu_ms", 1},
-    {"offset_ms", "DOUBLE PRECISION", "offset_ms", 2},
-    {"decoder", "TEXT", "decoder", 2},
+    {"status", "status", column_type::text, "TEXT NOT NULL", 1},
+    {"sentence", "error", column_type::text, "TEXT", 1},
+    {"sample_rate", "sample_rate", column_type::whole, "INTEGER", 1},
+    {"channels", "channels", column_type::whole, "INTEGER", 1},
+    {"duration_ms", "duration_ms", column_type::whole, "BIGINT", 1},
+    {"hl_pos_ms", "hl_pos_ms", column_type::whole, "INTEGER", 1},
+    {"hl_end_ms", "hl_end_ms", column_type::whole, "BIGINT", 1},
+    {"hl_refined", "hl_refined", column_type::whole, "INTEGER", 1},
+    {"bpm", "bpm", column_type::whole, "INTEGER", 1},
+    {"beats_ms", "beats_ms", column_type::list, nullptr, 1},
+    {"cpu_ms", "cpu_ms", column_type::whole, "BIGINT", 1},
+    {"offset_ms", "offset_ms", column_type::real, "DOUBLE PRECISION", 2},
+    {"decoder", "decoder", column_type::text, "TEXT", 2},
 };
 constexpr const char *kKey = "path, mode, length_s, max_beats";
 
-bool is_text(const result_column &column) {
-    return column.type != nullptr && std::string(column.type, 4) == "TEXT";
-}
-
-bool is_real(const result_column &column) {
-    return column.type != nullptr && column.type[0] == 'D';
-}
-
 std::string declaration(const result_column &column, const database_kind &kind) {
-    return std::string(column.name) + " " + (column.type == nullptr ? kind.json_type : column.type);
+    return std::string(column.name) + " " + (column.sql == nullptr ? kind.json_type : column.sql);
 }
 
 cell cell_of(const json &result, const char *key) {
@@ -58,58 +53,30 @@ cell cell_of(const json &result, const char *key) {
     return found->dump();
 }
 
-std::string now_text() {
-    const time_t now = time(nullptr);
-    tm parts{};
-    gmtime_r(&now, &parts);
-    std::array<char, 32> text{};
-    strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%SZ", &parts);
-    return text.data();
-}
-
 std::string host_name() {
     std::array<char, 256> name{};
     gethostname(name.data(), name.size() - 1);
     return as_utf8(name.data());
 }
 
-// Parses a number or a list of numbers. Drops deeper levels while reading, so that their depth
-// costs nothing.
-json parse_numbers(const std::string &text) {
-    const auto is_flat = [](int depth, json::parse_event_t event, const json &) {
-        return event == json::parse_event_t::value ||
-               (depth == 0 && event != json::parse_event_t::object_start);
-    };
-    return json::parse(text, is_flat, false);
-}
-
-bool are_numbers(const json &value) {
-    if (!value.is_array()) return value.is_number();
-    return std::all_of(value.begin(), value.end(),
-                       [](const json &item) { return item.is_number(); });
-}
-
-// Returns false if the cell is damaged.
-bool read_cell(const cell &value, const result_column &column, json &result) {
-    if (std::holds_alternative<std::monostate>(value)) return true;
+// Returns the cell as JSON, or a discarded value if it is damaged.
+json value_of(const cell &value, column_type type) {
+    const json damaged(json::value_t::discarded);
     const auto *number = std::get_if<int64_t>(&value);
     const auto *text = std::get_if<std::string>(&value);
-    if (number != nullptr && !is_text(column) && column.type != nullptr) {
-        result[column.key] = *number;
-        return true;
-    }
-    if (text == nullptr) return false;
-    if (is_text(column)) {
-        result[column.key] = as_utf8(*text);
-        return true;
-    }
-    json numbers = parse_numbers(*text);
-    const bool is_expected = are_numbers(numbers) && numbers.is_array() == !is_real(column);
-    if (is_expected && (column.type == nullptr || is_real(column))) {
-        result[column.key] = std::move(numbers);
-        return true;
-    }
-    return false;
+    const bool is_number = type == column_type::whole || type == column_type::real;
+    if (number != nullptr) return is_number ? json(*number) : damaged;
+    if (text == nullptr || type == column_type::whole) return damaged;
+    if (type == column_type::text) return as_utf8(*text);
+    // Nested lists are not parsed, so that their depth costs nothing.
+    const size_t last_bracket = text->find_last_of("[{");
+    if (last_bracket != std::string::npos && last_bracket > 0) return damaged;
+    const json parsed = json::parse(*text, nullptr, false);
+    if (type == column_type::real) return parsed.is_number() ? parsed : damaged;
+    const bool is_list =
+        parsed.is_array() && std::all_of(parsed.begin(), parsed.end(),
+                                         [](const json &item) { return item.is_number(); });
+    return is_list ? parsed : damaged;
 }
 
 }  // namespace
@@ -128,24 +95,24 @@ std::vector<std::string> upgrade_statements(const database_kind &kind) {
     table += ", version TEXT NOT NULL, host TEXT NOT NULL, finished " +
              std::string(kind.time_type) + " NOT NULL, PRIMARY KEY (" + kKey + "))";
     later.insert(later.begin(), table);
-    later.push_back(kind.set_version_statement(kTableVersion));
+    later.push_back(formatted(kind.set_version, kTableVersion));
     return later;
 }
 
-std::string put_statement() {
+std::string put_statement(const database_kind &kind) {
     std::vector<std::string> others = {"size", "mtime_ns"};
     for (const result_column &column : kResultColumns) others.emplace_back(column.name);
-    others.insert(others.end(), {"version", "host", "finished"});
+    others.insert(others.end(), {"version", "host"});
     std::string names = kKey;
     std::string values = "$1, $2, $3, $4";
-    std::string changes;
+    std::string changes = "finished = excluded.finished";
     for (size_t i = 0; i < others.size(); ++i) {
         names += ", " + others[i];
         values += ", $" + std::to_string(i + 5);
-        changes += (i == 0 ? "" : ", ") + others[i] + " = excluded." + others[i];
+        changes += ", " + others[i] + " = excluded." + others[i];
     }
-    return "INSERT INTO songs (" + names + ") VALUES (" + values + ") ON CONFLICT (" + kKey +
-           ") DO UPDATE SET " + changes;
+    return "INSERT INTO songs (" + names + ", finished) VALUES (" + values + ", " + kind.time_now +
+           ") ON CONFLICT (" + kKey + ") DO UPDATE SET " + changes;
 }
 
 void append_result_cells(row &cells, const std::string &text) {
@@ -153,7 +120,7 @@ void append_result_cells(row &cells, const std::string &text) {
     for (const result_column &column : kResultColumns) {
         cells.push_back(cell_of(result, column.key));
     }
-    cells.insert(cells.end(), {std::string(TAVO_VERSION), host_name(), now_text()});
+    cells.insert(cells.end(), {std::string(TAVO_VERSION), host_name()});
 }
 
 std::string page_query(int version) {
@@ -172,8 +139,11 @@ failure read_result_cells(const row &cells, const std::string &mode, std::string
     if (const auto *name = std::get_if<bytes>(&cells[0])) path = name->value;
     json object = {{"mode", mode}};
     for (size_t i = 0; i < std::size(kResultColumns); ++i) {
-        if (read_cell(cells[i + 1], kResultColumns[i], object)) continue;
-        return {std::string("Its row in the store is damaged: ") + kResultColumns[i].name +
+        const result_column &column = kResultColumns[i];
+        if (std::holds_alternative<std::monostate>(cells[i + 1])) continue;
+        object[column.key] = value_of(cells[i + 1], column.type);
+        if (!object[column.key].is_discarded()) continue;
+        return {std::string("Its row in the store is damaged: ") + column.name +
                 " cannot be read."};
     }
     if (object.contains("bpm") && !object.contains("beats_ms")) object["beats_ms"] = json::array();

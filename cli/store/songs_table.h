@@ -21,7 +21,7 @@ std::vector<std::string> upgrade_statements(const database_kind &kind);
 
 // Inserts a row or replaces the one with its key. Values: the key, the size, the time of change,
 // and the cells of append_result_cells.
-std::string put_statement();
+std::string put_statement(const database_kind &kind);
 void append_result_cells(row &cells, const std::string &json);
 
 // Selects the next rows in the order of their paths. Values: the key with the last path, $1 to $4,

@@ -1,6 +1,9 @@
 #include <sqlite3.h>
 #include <sys/stat.h>
 
+#include <algorithm>
+#include <iterator>
+
 #include "cli/store/database.h"
 #include "cli/write/file_names.h"
 
@@ -9,22 +12,13 @@ namespace {
 constexpr int kBusyMs = 2000;  // wait while another process writes to the file
 
 bool is_permanent(int code) {
-    switch (code & 0xFF) {
-        case SQLITE_BUSY:
-        case SQLITE_LOCKED:
-        case SQLITE_CANTOPEN:
-        case SQLITE_IOERR:
-        case SQLITE_FULL:
-        case SQLITE_NOMEM:
-        case SQLITE_PROTOCOL:
-        case SQLITE_INTERRUPT:
-            return false;
-        default:
-            return true;
-    }
+    constexpr int kTemporary[] = {SQLITE_BUSY, SQLITE_LOCKED, SQLITE_CANTOPEN, SQLITE_IOERR,
+                                  SQLITE_FULL, SQLITE_NOMEM,  SQLITE_PROTOCOL, SQLITE_INTERRUPT};
+    const auto *end = std::end(kTemporary);
+    return std::find(std::begin(kTemporary), end, code & 0xFF) == end;
 }
 
-// Returns SQLite's code. The connection must be closed after a failure too.
+// Returns SQLite's code.
 int connect(const std::string &name, int flags, sqlite3 **db) {
     int code = sqlite3_open_v2(name.c_str(), db, flags, nullptr);
     if (code != SQLITE_OK) return code;
@@ -60,18 +54,11 @@ failure open_file(const std::string &location, bool read_only, void **handle) {
         code = connect(host + percent_encoded(location) + "?immutable=1", flags | SQLITE_OPEN_URI,
                        &db);
     }
-    const char *file = code == SQLITE_OK ? sqlite3_db_filename(db, "main") : nullptr;
-    failure failed;
-    if (code != SQLITE_OK) failed = {sqlite3_errmsg(db), is_permanent(code)};
-    if (code == SQLITE_OK && (file == nullptr || *file == '\0')) {
-        failed = {"'" + location + "' is not a file and would be lost at the end", true};
-    }
-    if (failed) {
-        sqlite3_close(db);
-        return failed;
-    }
     *handle = db;
-    return {};
+    if (code != SQLITE_OK) return {sqlite3_errmsg(db), is_permanent(code)};
+    const char *file = sqlite3_db_filename(db, "main");
+    if (file != nullptr && *file != '\0') return {};
+    return {"'" + location + "' is not a file and would be lost at the end", true};
 }
 
 void bind(sqlite3_stmt *statement, int index, const cell &value) {
@@ -87,22 +74,16 @@ void bind(sqlite3_stmt *statement, int index, const cell &value) {
 }
 
 cell column(sqlite3_stmt *statement, int index) {
-    const auto size = [&] { return static_cast<size_t>(sqlite3_column_bytes(statement, index)); };
-    switch (sqlite3_column_type(statement, index)) {
-        case SQLITE_INTEGER:
-            return int64_t{sqlite3_column_int64(statement, index)};
-        case SQLITE_NULL:
-            return std::monostate();
-        case SQLITE_BLOB: {
-            const auto *data = static_cast<const char *>(sqlite3_column_blob(statement, index));
-            return data == nullptr ? bytes{} : bytes{std::string(data, size())};
-        }
-        default: {
-            const auto *text =
-                reinterpret_cast<const char *>(sqlite3_column_text(statement, index));
-            return text == nullptr ? std::string() : std::string(text, size());
-        }
+    const int type = sqlite3_column_type(statement, index);
+    if (type == SQLITE_NULL) return std::monostate();
+    if (type == SQLITE_INTEGER) return int64_t{sqlite3_column_int64(statement, index)};
+    const auto *data = static_cast<const char *>(sqlite3_column_blob(statement, index));
+    std::string value;
+    if (data != nullptr) {
+        value.assign(data, static_cast<size_t>(sqlite3_column_bytes(statement, index)));
     }
+    if (type == SQLITE_BLOB) return bytes{value};
+    return value;
 }
 
 failure run(void *handle, const std::string &sql, const row &values,
@@ -132,17 +113,14 @@ void close_file(void *handle) {
     sqlite3_close(static_cast<sqlite3 *>(handle));
 }
 
-std::string set_version_statement(int version) {
-    return "PRAGMA user_version = " + std::to_string(version);
-}
-
 constexpr database_kind kSqlite = {"BLOB",
                                    "TEXT",
+                                   "strftime('%Y-%m-%dT%H:%M:%SZ', 'now')",
                                    "TEXT",
                                    1U << 20,
                                    "PRAGMA user_version",
-                                   set_version_statement,
-                                   {"BEGIN IMMEDIATE", nullptr},
+                                   "PRAGMA user_version = %d",
+                                   "BEGIN IMMEDIATE",
                                    open_file,
                                    run,
                                    close_file};

@@ -5,10 +5,7 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
-#include <ctime>
-#include <nlohmann/json.hpp>
 
 #include "cli/run/stop.h"
 #include "cli/store/songs_table.h"
@@ -46,18 +43,12 @@ void disconnect(store &db) {
 failure connect(store &db) {
     if (db.handle != nullptr) return {};
     failure failed = db.kind->open(db.location, db.opts.from_store, &db.handle);
-    if (failed) db.handle = nullptr;
+    if (failed) disconnect(db);
     return failed;
 }
 
 std::string public_text(const store &db, const failure &failed) {
     return shown(without_credentials(failed.sentence, db.opts.store));
-}
-
-failure give_up(store &db, const failure &failed) {
-    if (!failed) return {};
-    db.has_failed = true;
-    return {"the store is given up: " + public_text(db, failed) + "."};
 }
 
 // Runs the work until it succeeds. Connects again after each temporary failure.
@@ -70,12 +61,18 @@ failure persist(store &db, const std::function<failure()> &work) {
         disconnect(db);
         const auto left = std::chrono::seconds(db.opts.patience_s) - (steady_clock::now() - start);
         const int64_t left_ms = std::chrono::duration_cast<milliseconds>(left).count();
-        if (failed.is_permanent || left_ms <= 0) return give_up(db, failed);
-        wait_ms = std::min(wait_ms, left_ms);
-        fprintf(stderr, "tavo: the store does not answer (%s); trying again in %.1f s.\n",
-                public_text(db, failed).c_str(), static_cast<double>(wait_ms) / 1000.0);
-        pollfd stop = {stop_fd(), POLLIN, 0};
-        if (poll(&stop, 1, static_cast<int>(wait_ms)) > 0) return give_up(db, failed);
+        const std::string reason = public_text(db, failed);
+        bool may_retry = !failed.is_permanent && left_ms > 0;
+        if (may_retry) {
+            wait_ms = std::min(wait_ms, left_ms);
+            fprintf(stderr, "tavo: the store does not answer (%s); trying again in %.1f s.\n",
+                    reason.c_str(), static_cast<double>(wait_ms) / 1000.0);
+            pollfd stop = {stop_fd(), POLLIN, 0};
+            may_retry = poll(&stop, 1, static_cast<int>(wait_ms)) <= 0;
+        }
+        if (may_retry) continue;
+        db.has_failed = true;
+        return {"the store is given up: " + reason + "."};
     }
 }
 
@@ -90,14 +87,8 @@ failure read_version(store &db) {
 
 // Makes the table or adds the columns that it lacks, all or nothing.
 failure upgrade(store &db) {
-    std::vector<std::string> statements;
-    for (const char *begin : db.kind->begin_upgrade) {
-        if (begin != nullptr) statements.emplace_back(begin);
-    }
-    for (size_t i = 0; i < statements.size(); ++i) {
-        if (failure failed = run(db, statements[i])) return failed;
-    }
-    failure failed = read_version(db);  // another command may have upgraded it meanwhile
+    failure failed = run(db, db.kind->begin_upgrade);
+    if (!failed) failed = read_version(db);  // another command may have upgraded it meanwhile
     if (!failed && db.version < kTableVersion) {
         for (const std::string &statement : upgrade_statements(*db.kind)) {
             if (!failed) failed = run(db, statement);
@@ -116,7 +107,7 @@ failure open_table(store &db) {
 }
 
 failure write_batch(const store &db) {
-    static const std::string sql = put_statement();
+    const std::string sql = put_statement(*db.kind);
     if (failure failed = run(db, "BEGIN")) return failed;
     for (const stored_song &song : db.batch) {
         row cells = key_of(db, song.path);

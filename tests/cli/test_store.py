@@ -137,7 +137,7 @@ class Store(Case):
         (expected,) = self.run_json("a.wav")
         with sqlite3.connect(self.folder / "x.db", isolation_level=None) as db:
             for name, column, value in (("deep", "beats_ms", "[" * 10**6), ("blob", "hl_pos_ms", b"x"),
-                                        ("word", "bpm", "many")):
+                                        ("nested", "beats_ms", "[" * 10**5 + "]" * 10**5), ("word", "bpm", "many")):
                 db.execute("CREATE TEMP TABLE one AS SELECT * FROM songs WHERE path = ?", (b"a.wav",))
                 db.execute(f"UPDATE one SET path = ?, {column} = ?", (name.encode(), value))
                 db.execute("INSERT INTO songs SELECT * FROM one")
@@ -146,7 +146,7 @@ class Store(Case):
                 db.execute(f"ALTER TABLE songs DROP COLUMN {column}")
             db.execute("PRAGMA user_version = 0")
         done = self.run_tavo(*STORE, "--from-store", "--format", "json", status=1)
-        damaged = [(b"blob", b"hl_pos_ms"), (b"deep", b"beats_ms"), (b"word", b"bpm")]
+        damaged = [(b"blob", b"hl_pos_ms"), (b"deep", b"beats_ms"), (b"nested", b"beats_ms"), (b"word", b"bpm")]
         self.assertEqual(done.stderr, b"".join(b"tavo: %s: Its row in the store is damaged: %s cannot be read.\n" % pair
                                                for pair in damaged))
         self.assertEqual(self.objects(done.stdout)[0]["beats_ms"], expected["beats_ms"])
