@@ -7,7 +7,7 @@ const [out, engine, wasm, page, ...parts] = process.argv.slice(2);
 const texts = { "engine.js": fs.readFileSync(engine, "utf8"),
   "engine.wasm": zlib.gzipSync(fs.readFileSync(wasm), { level: 9 }).toString("base64") };
 for (const part of parts) texts[part.replace(/.*\//, "")] = fs.readFileSync(part, "utf8");
-const song = texts["song.html"].replace("@STYLE@", () => texts["page.css"]).replace("@SCRIPT@", () => texts["song.js"]);
+const song = texts["song.html"].replace("@STYLE@", () => texts["page.css"]).replace("@SCRIPT@", () => texts["shared.js"] + texts["song.js"]);
 texts["song.html"] = JSON.stringify(song).replace(/</g, "\\u003c");
 fs.writeFileSync(out, fs.readFileSync(page, "utf8").replace(/@([a-z]+\.[a-z]+)@/g, (_, name) => {
   if (texts[name] === undefined) throw new Error("no part " + name);

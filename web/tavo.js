@@ -1,19 +1,10 @@
-"use strict";
 // The list of songs. A file is decoded by the browser, handed to a worker as a WAV, and shown.
-const byId = (id) => document.getElementById(id);
 const code = URL.createObjectURL(new Blob([byId("enginecode").textContent], { type: "text/javascript" }));
 const wasm = byId("wasm").textContent;
 const songPage = JSON.parse(byId("songpage").textContent);
 const RATE = 44100;  // Hz
 const queue = [];
 let busy = false, done = 0, stopCurrent = null, shown = null;
-
-function clock(ms) {
-  const tenths = Math.round(ms / 100), seconds = Math.floor(tenths / 10);
-  const h = Math.floor(seconds / 3600), m = Math.floor(seconds / 60) % 60;
-  const s = String(seconds % 60).padStart(2, "0") + "." + tenths % 10;
-  return h > 0 ? `${h}:${String(m).padStart(2, "0")}:${s}` : `${m}:${s}`;
-}
 
 // 16-bit mono, each sample the mean of all channels.
 function wavOf(sound) {
@@ -76,8 +67,7 @@ async function analyse(entry) {
   const about = song.hl_refined === false ? "about " : "";
   fill(entry, ["", clock(song.duration_ms), song.bpm === undefined ? "" : `${song.bpm} BPM`,
     song.hl_pos_ms === undefined ? "" : about + clock(song.hl_pos_ms), song.beats_ms ? String(song.beats_ms.length) : ""]);
-  const open = document.createElement("button");
-  open.textContent = file.name;
+  const open = element("button", file.name);
   open.addEventListener("click", () => show(entry));
   entry.cells[0].append(open);
 }
@@ -136,12 +126,8 @@ async function saveMarkers() {
   const [format, suffix] = byId("format").value.split(" ");
   const text = await work({ result: shown.result, length: shown.length, format, fps: byId("fps").value });
   if (typeof text !== "string") return;
-  const link = document.createElement("a");
-  link.href = URL.createObjectURL(new Blob([text], { type: "text/plain" }));
   const name = shown.file.name;
-  link.download = (format === "llc" ? name.replace(/\.[^.]*$/, "") : name) + suffix;
-  link.click();
-  setTimeout(() => URL.revokeObjectURL(link.href), 1000);
+  download((format === "llc" ? name.replace(/\.[^.]*$/, "") : name) + suffix, "text/plain", text);
 }
 
 function stop() {

@@ -1,4 +1,3 @@
-"use strict";
 // Sorts the songs by a column and shows those whose name holds what is sought.
 const body = document.querySelector("#songs tbody");
 const heads = [...document.querySelectorAll("#songs thead th")];
@@ -28,12 +27,12 @@ function search(words) {
     row.hidden = !sought.every((word) => name.includes(word));
     shown += row.hidden ? 0 : 1;
   }
-  document.getElementById("status").textContent = `${shown} of ${body.rows.length} songs`;
+  byId("status").textContent = `${shown} of ${body.rows.length} songs`;
 }
 
 heads.forEach((head, column) => {
   const button = head.querySelector("button");
   if (button) button.addEventListener("click", () => sortBy(column));
 });
-document.getElementById("search").addEventListener("input", (event) => search(event.target.value));
+byId("search").addEventListener("input", (event) => search(event.target.value));
 search("");

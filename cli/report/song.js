@@ -1,23 +1,11 @@
-"use strict";
 // Draws one song's result on one time axis, in ms of the player, and plays the song.
 const song = JSON.parse(document.getElementById("data").textContent);
-const byId = (id) => document.getElementById(id);
 const beats = song.beats_ms || [];
 const hasHighlight = song.hl_pos_ms !== undefined;
 const loopEnd = hasHighlight ? Math.min(song.region_end_ms, song.length_ms) : 0;
 const timeline = byId("timeline");
 const svg = timeline.querySelector("svg");
 const view = { from: 0, to: song.length_ms };
-
-// m:ss.t, with hours when there are any.
-function clock(ms) {
-  const tenths = Math.max(0, Math.round(ms / 100));
-  const seconds = Math.floor(tenths / 10);
-  const h = Math.floor(seconds / 3600);
-  const m = Math.floor(seconds / 60) % 60;
-  const s = String(seconds % 60).padStart(2, "0") + "." + tenths % 10;
-  return h > 0 ? `${h}:${String(m).padStart(2, "0")}:${s}` : `${m}:${s}`;
-}
 
 function shape(name, attributes, parent = svg) {
   const made = document.createElementNS("http://www.w3.org/2000/svg", name);
@@ -50,10 +38,9 @@ function drawLoudness() {
   const y = (value) => (79 - value / top * 29).toFixed(2);
   // A value is drawn in the middle of its window of 6 s.
   const points = song.loudness.map((value, k) => `${song.sound_ms + 2000 * k + 3000} ${y(value)}`);
-  if (points.length > 0) {
-    shape("path", { class: "loud", d: "M" + points.join("L") });
-    shape("line", { class: "mean", x1: 0, x2: song.length_ms, y1: y(song.mean), y2: y(song.mean) });
-  }
+  if (points.length === 0) return;
+  shape("path", { class: "loud", d: "M" + points.join("L") });
+  shape("line", { class: "mean", x1: 0, x2: song.length_ms, y1: y(song.mean), y2: y(song.mean) });
 }
 
 function box(kind, from, to) {
@@ -66,9 +53,7 @@ function draw() {
     box("unsearched", song.searched_ms[1], song.length_ms);
   }
   byId("unsearched").hidden = !song.searched_ms;
-  if (hasHighlight) {
-    box("region", song.hl_pos_ms, loopEnd);
-  }
+  if (hasHighlight) box("region", song.hl_pos_ms, loopEnd);
   drawWave();
   drawLoudness();
   byId("beatname").hidden = beats.length === 0;
@@ -85,8 +70,7 @@ function drawTicks() {
   const step = steps.find((each) => span / each <= most) || span;
   const ticks = [];
   for (let t = Math.ceil(view.from / step) * step; t <= view.to; t += step) {
-    const label = document.createElement("span");
-    label.textContent = step < 1000 ? clock(t) : clock(t).replace(/\.\d$/, "");
+    const label = element("span", step < 1000 ? clock(t) : clock(t).replace(/\.\d$/, ""));
     const x = timeline.clientWidth * (t - view.from) / span;
     label.style.left = `${Math.min(timeline.clientWidth - 18, Math.max(18, x))}px`;  // half a label
     ticks.push(label);
@@ -132,14 +116,6 @@ function pictureSvg() {
   return new XMLSerializer().serializeToString(root);
 }
 
-function download(name, type, content) {
-  const link = document.createElement("a");
-  link.href = URL.createObjectURL(new Blob([content], { type }));
-  link.download = name;
-  link.click();
-  setTimeout(() => URL.revokeObjectURL(link.href), 1000);
-}
-
 function show(from, to) {
   const span = Math.min(Math.max(to - from, 200), song.length_ms);
   view.from = Math.min(Math.max(from, 0), song.length_ms - span);
@@ -155,13 +131,10 @@ function zoom(factor, around) {
   show(middle - part * span, middle + (1 - part) * span);
 }
 
-function nearestBeat(ms) {
-  return beats.reduce((best, beat) => Math.abs(beat - ms) < Math.abs(best - ms) ? beat : best, beats[0]);
-}
-
 function zoomToBeat() {
-  const beat = nearestBeat(player.now());
-  if (beat !== undefined) show(beat - 1000, beat + 1000);
+  const now = player.now();
+  const nearest = beats.reduce((best, beat) => Math.abs(beat - now) < Math.abs(best - now) ? beat : best);
+  show(nearest - 1000, nearest + 1000);
 }
 
 // ---- Sound. A linked file plays in an audio element: a page from disk cannot route it through an
@@ -368,21 +341,14 @@ async function copy(words) {
 }
 
 function timeButton(ms) {
-  const item = document.createElement("li");
-  const button = document.createElement("button");
-  button.textContent = clock(ms);
+  const button = element("button", clock(ms));
   button.addEventListener("click", () => { seek(ms); copy(clock(ms)); });
-  item.append(button);
-  return item;
+  return element("li", button);
 }
 
-function fact(words, value, ms) {
-  const item = document.createElement("li");
-  item.append(words + " ");
-  const strong = document.createElement("b");
-  strong.textContent = value;
-  item.append(strong);
-  if (ms !== undefined) {
+function fact(words, value, isCopied = false) {
+  const item = element("li", words + " ", element("b", value));
+  if (isCopied) {
     item.style.cursor = "copy";
     item.title = "Copy";
     item.addEventListener("click", () => copy(value));
@@ -396,7 +362,7 @@ fact("length", clock(song.duration_ms));
 fact("", `${song.sample_rate} Hz, ${song.channels} ${song.channels === 1 ? "channel" : "channels"}`);
 if (hasHighlight) {
   const about = song.hl_refined === false ? "about " : "";
-  fact("highlight", about + clock(song.hl_pos_ms) + (song.hl_end_ms === undefined ? "" : ` to ${clock(song.hl_end_ms)}`), song.hl_pos_ms);
+  fact("highlight", about + clock(song.hl_pos_ms) + (song.hl_end_ms === undefined ? "" : ` to ${clock(song.hl_end_ms)}`), true);
 }
 if (song.bpm !== undefined) {
   fact(song.mode === "both" ? "tempo from the highlight on" : "tempo", `${song.bpm} BPM`);

@@ -36,7 +36,7 @@ character first_character(std::string_view text) {
     bool is_valid = length > 1 && bytes.size() == length;
     for (const char byte : bytes.substr(1)) {
         is_valid = is_valid && (byte & 0xC0) == 0x80;
-        point = point << 6 | (byte & 0x3Fu);
+        point = point << 6 | (static_cast<uint8_t>(byte) & 0x3Fu);
     }
     const bool is_surrogate = point >= 0xD800 && point <= 0xDFFF;
     is_valid = is_valid && point >= kLeast[length] && point <= 0x10FFFF && !is_surrogate;

@@ -1,0 +1,24 @@
+"use strict";
+const byId = (id) => document.getElementById(id);
+
+// m:ss.t, with hours when there are any.
+function clock(ms) {
+  const tenths = Math.max(0, Math.round(ms / 100));
+  const [h, m, s] = [tenths / 36000, tenths / 600 % 60, tenths / 10 % 60].map(Math.floor);
+  const two = (number) => String(number).padStart(2, "0");
+  return `${h > 0 ? `${h}:${two(m)}` : m}:${two(s)}.${tenths % 10}`;
+}
+
+function element(name, ...content) {
+  const made = document.createElement(name);
+  made.append(...content);
+  return made;
+}
+
+function download(name, type, content) {
+  const link = element("a");
+  link.href = URL.createObjectURL(new Blob([content], { type }));
+  link.download = name;
+  link.click();
+  setTimeout(() => URL.revokeObjectURL(link.href), 1000);
+}
