@@ -19,7 +19,8 @@ namespace {
 constexpr int32_t kBlockSamples = 4096;
 constexpr size_t kColumns = 4000;    // of the time axis: sharp when zoomed, about 30 KB
 constexpr size_t kMostBins = 16384;  // several per column, so that edges stay sharp
-constexpr auto kHopMs = static_cast<double>(TAVO_LOUDNESS_HOP_MS);
+constexpr double kHopMs = int{TAVO_LOUDNESS_HOP_MS};
+constexpr double kWindowMs = int{TAVO_LOUDNESS_WINDOW_MS};
 constexpr size_t kWindowHops = TAVO_LOUDNESS_WINDOW_MS / TAVO_LOUDNESS_HOP_MS;
 
 // The lowest and the highest sample of a span.
@@ -137,11 +138,12 @@ std::vector<float> loudness_of(const sound &song, int64_t samples_per_hop) {
 // of values.
 result_json searched_span(const record &result, size_t loudness) {
     const bool is_short = result.duration_ms / 1000 < TAVO_SHORT_SONG_S;
-    const double start = is_short ? 0.0 : TAVO_SEARCH_SKIP * kHopMs;
-    const double tail = is_short ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
+    const int skip = is_short ? 0 : TAVO_SEARCH_SKIP;
+    const int tail = is_short ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
+    const double start = skip * kHopMs;
     // The last window that is searched may have its rise at its very end.
     const double last = static_cast<double>(loudness) - tail;
-    const double end = last < 0.0 ? start : last * kHopMs + TAVO_LOUDNESS_WINDOW_MS;
+    const double end = last < 0.0 ? start : last * kHopMs + kWindowMs;
     return {player_ms(result, start), player_ms(result, std::max(start, end))};
 }
 

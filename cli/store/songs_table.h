@@ -22,7 +22,7 @@ std::vector<std::string> upgrade_statements(const database_kind &kind);
 // Inserts a row or replaces the one with its key. Values: the key, the size, the time of change,
 // and the cells of append_result_cells.
 std::string put_statement(const database_kind &kind);
-void append_result_cells(row &cells, const std::string &json);
+void append_result_cells(row &cells, const std::string &text);
 
 // Selects the next rows in the order of their paths. Values: the key with the last path, $1 to $4,
 // the status, $5, and the number of rows, $6.
