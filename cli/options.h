@@ -29,14 +29,14 @@ struct options {
     int32_t max_minutes = 600;  // longer audio is refused
     result_format format = result_format::text;
     const marker_format *markers = nullptr;  // of the format markers
-    std::string print;       // template of the format print
-    std::string click;       // where the click track goes, empty for none
-    std::string clip;        // where clips go, a file or a folder; empty for none
-    double fade_s = 0.0;     // of a clip, at either end
-    std::string report;      // where the page goes, empty for none
-    bool embed = false;      // the sound goes into the page
-    std::string output_dir;  // of marker files; empty: beside each input
-    std::string fps = "30";  // of the formats that count in frames, frame_rate.h
+    std::string print;                       // template of the format print
+    std::string click;                       // where the click track goes, empty for none
+    std::string clip;                        // where clips go, a file or a folder; empty for none
+    double fade_s = 0.0;                     // of a clip, at either end
+    std::string report;                      // where the page goes, empty for none
+    bool embed = false;                      // the sound goes into the page
+    std::string output_dir;                  // of marker files; empty: beside each input
+    std::string fps = "30";                  // of the formats that count in frames, frame_rate.h
     bool force = false;
     bool skip_existing = false;
     bool quiet = false;
