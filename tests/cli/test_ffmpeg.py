@@ -1,4 +1,4 @@
-"""Tests the ffmpeg program as decoder of formats that the library does not support, and as cutter of clips."""
+"""Tests that ffmpeg decodes files that the library refuses, and cuts clips."""
 import os
 import pathlib
 import signal
