@@ -8,22 +8,22 @@ constexpr const char *kAbout =
     "starts), their tempo and their beats.";
 
 constexpr const char *kFooter =
-    "A folder is searched for audio files, recognised by content rather than by\n"
-    "name. A list has one name a line (M3U playlists will do) and is read as it\n"
-    "comes. Results go to standard output in the order of the inputs, messages to\n"
-    "standard error.\n\n"
-    "The start of a highlight is exact to 0.4 s where the loud passage is louder\n"
-    "than about -13 dBFS RMS; elsewhere it is a point of a 2 s grid, usually 2 to\n"
-    "6 s early, and the text says \"about\"; --normalize refines it. In mode both\n"
-    "the tempo is that of the music from the highlight on.\n\n"
-    "Exit status: 0 all done; 1 a file failed; 2 wrong usage; 130 stopped with\n"
-    "Ctrl-C; 141 the reader of the results has gone.\n";
+    "A folder is searched for audio files, which are recognised by content, not by\n"
+    "name. A list has one name per line (M3U playlists are accepted) and is read as\n"
+    "it arrives. Results go to standard output in the order of the inputs, messages\n"
+    "to standard error.\n\n"
+    "The start of a highlight is exact to 0.4 s if the loud passage is louder than\n"
+    "about -13 dBFS RMS. Otherwise it is a point on a 2 s grid, usually 2 to 6 s\n"
+    "early, and the text says \"about\"; --normalize refines it. In mode both the\n"
+    "tempo is that of the music from the highlight on.\n\n"
+    "Exit status: 0 success; 1 a file failed; 2 wrong usage; 130 stopped with\n"
+    "Ctrl-C; 141 the reader of the results has closed them.\n";
 
 constexpr const char *kExamples =
     "Examples:\n"
-    "  tavo song.mp3                       a summary for people\n"
+    "  tavo song.mp3                       a summary as text\n"
     "  tavo -f labels -l 30 song.mp3       song.mp3.labels.txt, for Audacity\n"
-    "  tavo -f json -r -j 2 Music          one JSON object a line for each file\n"
+    "  tavo -f json -r -j 2 Music          one JSON object per line and file\n"
     "  tavo --report song.html song.mp3    a page that shows and plays the song\n"
     "  find . -name '*.flac' -print0 | tavo -0 -f csv -\n";
 

@@ -21,14 +21,14 @@
 namespace {
 
 constexpr int32_t kMostJobs = 256;
-constexpr int32_t kMostSeconds = 86'400;  // a day: beyond any song, far below what overflows
+constexpr int32_t kMostSeconds = 86'400;  // one day: longer than any song, far below an overflow
 constexpr int32_t kMostMinutes = 1'000'000;
 constexpr int32_t kMostBeats = 1'000'000'000;
 
-constexpr size_t kOptionColumns = 28;  // of the names in --help
+constexpr size_t kOptionColumns = 28;  // width of the names in --help
 constexpr size_t kTextColumns = 80 - kOptionColumns;
 
-// In the order of result_format. The formats of markers follow.
+// Ordered as result_format.
 const std::vector<std::string> kFormats = {"text", "json", "csv"};
 
 std::vector<std::string> format_words() {
@@ -43,7 +43,7 @@ void set_format(const std::string &word, options &out) {
     out.markers = find_marker_format(word);
 }
 
-// Breaks the line at spaces.
+// Wraps the text at spaces.
 std::string wrapped(const std::string &text) {
     std::string out;
     size_t used = 0;
@@ -61,11 +61,11 @@ int wrong_usage(const std::string &sentence) {
     return kExitUsage;
 }
 
-// The parser splits a value in square brackets at its commas, which must not happen to a file's
-// name: a byte before the bracket prevents it, and unshield removes it.
+// The parser splits a value in square brackets at its commas. For file names shield prevents this
+// by a byte before the bracket, and unshield removes it.
 constexpr char kShield = '\x01';
 
-// The arguments as the parser takes them: last to first.
+// The arguments in the order that the parser requires, last to first.
 std::vector<std::string> shielded(int argc, char **argv) {
     std::vector<std::string> out;
     for (int i = argc - 1; i > 0; --i) {
@@ -79,13 +79,13 @@ void unshield(std::string &value) {
     if (value.size() > 1 && value[0] == kShield && value[1] == '[') value.erase(0, 1);
 }
 
-// Declares an option that takes a text.
+// Declares an option with a text value.
 CLI::Option *add_text(CLI::App &app, const char *names, std::string &value, const char *type,
                       const char *description) {
     return app.add_option(names, value, description)->type_name(type);
 }
 
-// Declares an option that takes a whole number, whose type is SECONDS or N.
+// Declares an option with a whole number as value. type: SECONDS or N.
 void add_number(CLI::App &app, const char *names, int32_t &value, std::pair<int32_t, int32_t> range,
                 const std::string &type, const char *description) {
     const auto check = [=](const std::string &text) {
@@ -102,8 +102,7 @@ void add_number(CLI::App &app, const char *names, int32_t &value, std::pair<int3
 void declare_inputs(CLI::App &app, options &out) {
     app.add_option("FILE", out.inputs, "Audio files, folders, or '-': a list on standard input")
         ->type_name("");
-    app.add_flag("-r,--recursive", out.recursive,
-                 "Search folders inside folders too, linked ones included");
+    app.add_flag("-r,--recursive", out.recursive, "Search subfolders too, including linked ones");
     app.add_option("--files-from", out.lists, "A list of files; '-' is standard input")
         ->allow_extra_args(false)
         ->type_name("LIST");
@@ -119,49 +118,49 @@ void declare_analysis(CLI::App &app, options &out) {
         ->check(CLI::IsMember({"highlight", "beats", "both"}).description(""))
         ->type_name("MODE");
     add_number(app, "-l,--length", out.length_s, {0, kMostSeconds}, "SECONDS",
-               "Length of the highlight wanted: the start is placed so that a passage of this "
+               "Requested length of the highlight. The start is moved so that a passage of this "
                "length ends at a boundary of the music");
     add_number(app, "--max-beats", out.max_beats, {0, kMostBeats}, "N",
                "Maximum number of threshold-selected beats");
     add_number(app, "--max-minutes", out.max_minutes, {1, kMostMinutes}, "N",
                "Refuse audio that lasts longer; 600 by default");
     add_number(app, "-j,--jobs", out.jobs, {1, kMostJobs}, "N",
-               "Files analysed at once, each in a process of its own; 1 by default");
+               "Files analysed in parallel, each in its own process; 1 by default");
     add_number(app, "--timeout", out.timeout_s, {0, kMostSeconds}, "SECONDS",
-               "Give up a file whose analysis takes longer; by default none is given up");
+               "Longest analysis of a file; a file that takes longer fails. No limit by default");
     app.add_flag("--normalize", out.normalize,
-                 "Refine the highlight of a quiet song: search it again, raised in level; needs "
-                 "ffmpeg");
+                 "Refine the highlight of a quiet song by a second search in the amplified song; "
+                 "needs ffmpeg");
     app.add_flag("--no-ffmpeg", "Decode nothing with the ffmpeg program, even if it is installed");
 }
 
 void declare_output(CLI::App &app, options &out) {
     app.add_option_function<std::string>(
            "-f,--format", [&out](const std::string &word) { set_format(word, out); },
-           "text (default) for people, json: one object a line, csv: one row a file; or "
-           "markers for an editor, a file beside each input: labels (Audacity), kdenlive, "
-           "llc (LosslessCut), ffmetadata (chapters), edl (DaVinci Resolve), fcpxml, otio, "
-           "reaper. Markers span 30 s of highlight without --length")
+           "text (default), json (one object per line), csv (one row per file); or a marker file "
+           "for an editor beside each input: labels (Audacity), kdenlive, llc (LosslessCut), "
+           "ffmetadata (chapters), edl (DaVinci Resolve), fcpxml, otio, reaper. Without --length "
+           "the highlight is marked for 30 s")
         ->check(CLI::IsMember(format_words()).description(""))
         ->type_name("FORMAT");
     add_text(app, "--print", out.print, "TEXT",
              "Write this text for each song, with {file}, {stem}, {hl_s}, {hl_ms}, {end_s}, {bpm} "
-             "and {beats} replaced, \\n and \\t for a line's end and a tab");
+             "and {beats} replaced; \\n is a new line, \\t a tab");
     add_text(app, "-o,--output-dir", out.output_dir, "DIR",
-             "Folder for the marker files; by default they are written beside each file");
+             "Folder for the marker files; by default they are written beside each input");
     add_text(app, "--fps", out.fps, "RATE",
-             "Frames a second for edl, fcpxml and otio: 23.976, 24, 25, 29.97, 29.97df "
+             "Frames per second for edl, fcpxml and otio: 23.976, 24, 25, 29.97, 29.97df "
              "(drop-frame), 30 (default), 50, 59.94, 59.94df, 60")
         ->check(CLI::IsMember(frame_rate_names()).description(""));
     app.add_flag("--force", out.force,
-                 "Overwrite marker files, click tracks, clips and pages that exist");
-    app.add_flag("--skip-existing", out.skip_existing, "Leave out inputs whose marker file exists");
+                 "Overwrite existing marker files, click tracks, clips and pages");
+    app.add_flag("--skip-existing", out.skip_existing, "Skip inputs whose marker file exists");
     add_text(app, "--click", out.click, "WAV",
-             "Write the analysed sound with a click on every beat, a WAV file; from the highlight "
-             "on in mode both; one input only");
+             "Write a WAV file of the analysed sound with a click on every beat, in mode both from "
+             "the highlight on; only for a single input");
     add_text(app, "--clip", out.clip, "FILE|DIR",
-             "Cut --length seconds of highlight into an audio file of the name's kind, or into a "
-             "file for each input in a folder; needs ffmpeg");
+             "Write --length seconds from the highlight on to an audio file, whose extension "
+             "selects the format, or to one file per input in a folder; needs ffmpeg");
     app.add_option("--fade", out.fade_s, "Fade the clip in at its start and out at its end")
         ->check(CLI::Range(0.0, static_cast<double>(kMostSeconds)).description(""))
         ->type_name("SECONDS");
@@ -170,31 +169,30 @@ void declare_output(CLI::App &app, options &out) {
 
 void declare_page(CLI::App &app, options &out) {
     add_text(app, "--report", out.report, "HTML",
-             "Write a page that shows and plays the song, an HTML file; for several inputs an "
-             "index, the pages in a folder beside it");
+             "Write an HTML page that shows and plays the song; for several inputs an index, with "
+             "the pages in a folder beside it");
     app.add_flag("--embed", out.embed, "Put the sound into the page");
 }
 
 void declare_catalogue(CLI::App &app, options &out) {
     add_text(app, "--store", out.store, "URL",
-             "Keep the results in a database: sqlite:FILE, FILE.db or postgresql://HOST/DATABASE. "
-             "Songs that it knows are left out; standard output is used only with --format");
-    app.add_flag("--retry-failed", out.retry_failed, "Analyse songs again that failed");
+             "Store the results in a database: sqlite:FILE, FILE.db or postgresql://HOST/DATABASE. "
+             "Songs that are already stored are skipped. Prints results only with --format");
+    app.add_flag("--retry-failed", out.retry_failed, "Analyse failed songs again");
     app.add_flag("--redo", out.redo, "Analyse every song again");
     app.add_flag("--from-store", out.from_store,
-                 "Write out what the store holds for --mode, --length and --max-beats; analyses "
-                 "nothing");
+                 "Write the stored results for --mode, --length and --max-beats; analyses nothing");
     app.add_flag("--failed", out.failed, "With --from-store: the songs that failed, and why");
     add_number(app, "--patience", out.patience_s, {0, kMostSeconds}, "SECONDS",
-               "How long a store that does not answer is tried again; 60 by default");
+               "How long to retry a store that does not respond; 60 by default");
     const auto set_shard = [&out](const std::string &words) {
         const failure wrong = read_shard(words, out.share);
         if (wrong) throw CLI::ValidationError(wrong.sentence);
     };
     app.add_option_function<std::string>(
            "--shard", set_shard,
-           "Only the share I of N of the inputs, for engines that run one command many times; "
-           "auto: as Slurm, Kubernetes or AWS Batch says")
+           "Analyse only part I of N of the inputs, for schedulers that run one command many "
+           "times; auto: as set by Slurm, Kubernetes or AWS Batch")
         ->type_name("I/N");
 }
 
@@ -234,7 +232,7 @@ bool is_folder(const std::string &path) {
     return std::filesystem::is_directory(path, ignored);
 }
 
-// A combination of options that may not be, and the sentence about it.
+// A combination of options that is not allowed, and the error sentence.
 using contradiction = std::pair<bool, std::string>;
 
 failure first_of(std::initializer_list<contradiction> table) {
@@ -252,45 +250,46 @@ failure check_output(const CLI::App &app, const options &out) {
     const failure bad_template = fill_template(out.print, {}, sample);
     return first_of({
         {!out.output_dir.empty() && !has_files,
-         "--output-dir goes with the formats that write files, like --format labels."},
+         "--output-dir needs a format that writes files, such as --format labels."},
         {app.count("--fps") > 0 && !has_frames,
-         "--fps goes with --format edl, fcpxml and otio, which count in frames."},
-        {!out.print.empty() && app.count("--format") > 0, "--print takes the place of --format."},
+         "--fps is only for --format edl, fcpxml and otio, which count frames."},
+        {!out.print.empty() && app.count("--format") > 0,
+         "--print replaces --format; give only "
+         "one of them."},
         {!bad_template.sentence.empty(), bad_template.sentence},
         {out.skip_existing && !has_files,
-         "--skip-existing goes with the formats that write files, like --format labels."},
+         "--skip-existing needs a format that writes files, such as --format labels."},
         {out.skip_existing && out.force, "--skip-existing and --force exclude each other."},
         {!out.output_dir.empty() && !is_folder(out.output_dir),
          out.output_dir + ": is not a folder."},
         {has_click && out.mode == TAVO_MODE_HIGHLIGHT,
          "--click needs beats: --mode beats or both."},
-        {out.embed && out.report.empty(), "--embed is about --report."},
+        {out.embed && out.report.empty(), "--embed needs --report."},
         {out.normalize && out.mode == TAVO_MODE_BEATS,
          "--normalize needs a highlight: --mode highlight or both."},
-        {out.normalize && !out.store.empty(),
-         "--normalize does not go with --store, which keeps no such results."},
+        {out.normalize && !out.store.empty(), "--normalize cannot be combined with --store."},
         {out.normalize && out.ffmpeg.empty(),
          "--normalize needs the ffmpeg program, which was not found."},
-        {has_click && out.click == out.report, "--click and --report name one file."},
+        {has_click && out.click == out.report, "--click and --report name the same file."},
         {has_click && !takes_one_file(out), "--click takes exactly one audio file."},
     });
 }
 
 failure check_clip(const options &out) {
-    if (out.clip.empty()) return {out.fade_s > 0.0 ? "--fade is about --clip." : ""};
+    if (out.clip.empty()) return {out.fade_s > 0.0 ? "--fade needs --clip." : ""};
     const bool is_file = !is_folder(out.clip);
     const std::string name = base_name(out.clip);
     return first_of({
-        {out.length_s == 0, "--clip needs --length, its seconds."},
+        {out.length_s == 0, "--clip needs --length."},
         {out.mode == TAVO_MODE_BEATS, "--clip needs a highlight: --mode highlight or both."},
-        {2 * out.fade_s > out.length_s, "--fade takes at most half of --length."},
+        {2 * out.fade_s > out.length_s, "--fade can be at most half of --length."},
         {out.ffmpeg.empty(), "--clip needs the ffmpeg program, which was not found."},
         {out.clip == out.click || out.clip == out.report,
          "--clip names the file of another option."},
         {is_file && !takes_one_file(out),
          "--clip takes exactly one audio file, or a folder for the clips."},
         {is_file && stem(name) == name,
-         "--clip needs a folder, or a name with an ending: clip.mp3."},
+         "--clip needs a folder, or a name with an extension, such as clip.mp3."},
     });
 }
 
@@ -303,20 +302,20 @@ failure check_inputs(const options &out) {
         {!has_inputs && !out.from_store,
          "name at least one audio file, a folder, or '-' for a list on standard input."},
         {out.list_separator == '\0' && !has_list,
-         "-0 is about lists of files: give '-' or --files-from."},
+         "-0 applies only to lists of files: give '-' or --files-from."},
         {out.store.empty() && (out.from_store || out.redo || out.retry_failed),
-         "--from-store, --redo and --retry-failed are about a --store."},
-        {out.redo && out.retry_failed, "--redo analyses failed songs too."},
-        {out.from_store && has_inputs, "--from-store takes no other inputs."},
-        {out.failed && !out.from_store, "--failed goes with --from-store."},
+         "--from-store, --redo and --retry-failed need --store."},
+        {out.redo && out.retry_failed, "--redo already includes failed songs."},
+        {out.from_store && has_inputs, "--from-store accepts no inputs."},
+        {out.failed && !out.from_store, "--failed needs --from-store."},
         {out.failed && (out.markers != nullptr || has_page),
-         "--failed goes with --format text, json or csv."},
+         "--failed needs --format text, json or csv."},
         {out.from_store && out.format == result_format::none && !has_page,
          "--from-store needs --format or --report."},
     });
 }
 
-// Sets what depends on several options, and refuses those that contradict each other.
+// Sets the values that depend on several options, and refuses contradictory options.
 failure complete(const CLI::App &app, options &out) {
     if (!out.print.empty()) {
         out.format = result_format::print;
@@ -329,14 +328,14 @@ failure complete(const CLI::App &app, options &out) {
     return check_clip(out);
 }
 
-// Warns about options without effect, and with less effect than one may expect.
+// Warns about options that have no effect or less effect than expected.
 void write_notes(const options &out) {
     const std::pair<bool, const char *> table[] = {
         {out.length_s > 0 && out.mode == TAVO_MODE_BEATS, "--length has no effect in mode beats."},
         {out.max_beats > 0 && out.mode == TAVO_MODE_HIGHLIGHT,
          "--max-beats has no effect in mode highlight."},
         {!out.click.empty() && out.mode == TAVO_MODE_BOTH,
-         "the click track starts at the highlight; --mode beats clicks all of it."},
+         "the click track starts at the highlight; --mode beats makes one of the whole song."},
     };
     for (const auto &[is_due, note] : table) {
         if (is_due && !out.quiet) fprintf(stderr, "tavo: %s\n", note);

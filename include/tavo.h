@@ -101,9 +101,9 @@ enum {
     TAVO_LOUDNESS_WINDOW_MS = 6000 /**< length of a window */
 };
 
-/** The margins of the highlight search: values of the loudness curve where it looks for no rise. */
+/** Margins of the highlight search: values at the ends of the curve that are not searched. */
 enum {
-    TAVO_SHORT_SONG_S = 90,     /**< a song of fewer seconds has the narrower margins */
+    TAVO_SHORT_SONG_S = 90,     /**< songs of fewer seconds have narrower margins */
     TAVO_SEARCH_SKIP = 9,       /**< values at the start; 0 in a short song */
     TAVO_SEARCH_TAIL = 25,      /**< values at the end */
     TAVO_SHORT_SEARCH_TAIL = 10 /**< values at the end of a short song */

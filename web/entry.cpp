@@ -1,4 +1,4 @@
-// What the page's worker calls. Strings are UTF-8; a returned one is freed by the caller with free.
+// Functions for the page's worker. Strings are UTF-8. The caller frees a returned string with free.
 #include <cstdint>
 #include <cstring>
 #include <string>
@@ -47,7 +47,7 @@ void analyse_song(record &result, int32_t max_beats) {
     result.has_stream = true;
     TAVO_INFO info{};
     tavo_set_listener(ctx, store_result, &info);
-    // Returns after the job: threads.c.
+    // tavo_analyze returns after the job, see threads.c.
     if (tavo_analyze(ctx, result.length_s, max_beats, 0) == TAVO_OK) {
         read_result(ctx, info, result);
     } else {
@@ -59,7 +59,7 @@ void analyse_song(record &result, int32_t max_beats) {
 }  // namespace
 
 // Analyses the WAV file at path. channels: of the song before the downmix. Returns JSON: "song" for
-// song.js and "result" as --format json has it; without "song" if the analysis failed.
+// song.js and "result" in the form of --format json; without "song" if the analysis failed.
 extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, int32_t max_beats,
                              int32_t channels) {
     fnamedec = "";
@@ -78,8 +78,8 @@ extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, i
     return strdup(out.dump().c_str());
 }
 
-// The marker file of a result. result: the "result" of web_analyse. Returns the file's content, or
-// null for an unknown format.
+// Returns the content of the marker file of a result, or null for an unknown format. result: the
+// "result" of web_analyse.
 extern "C" char *web_markers(const char *result, int32_t length_s, const char *format,
                              const char *fps) {
     record song = record_from_json(result);

@@ -1,4 +1,4 @@
-// The formats of the page: only WAV, in which the page passes the decoded sound.
+// The formats of the page: only WAV, because the page decodes the song and passes it as WAV.
 #include "media_source/format_table.h"
 
 const format_ops *format_ops_of(int32_t type) {

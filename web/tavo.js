@@ -1,4 +1,5 @@
-// The list of songs. A file is decoded by the browser, handed to a worker as a WAV, and shown.
+// The list of songs. The browser decodes a file, passes it to a worker as WAV, and shows the
+// result.
 const code = URL.createObjectURL(new Blob([byId("enginecode").textContent], { type: "text/javascript" }));
 const wasm = byId("wasm").textContent;
 const songPage = JSON.parse(byId("songpage").textContent);
@@ -6,7 +7,7 @@ const RATE = 44100;  // Hz
 const queue = [];
 let busy = false, done = 0, stopCurrent = null, shown = null;
 
-// 16-bit mono, each sample the mean of all channels.
+// Returns a WAV file in 16-bit mono; each sample is the mean of all channels.
 function wavOf(sound) {
   const count = sound.length, wav = new ArrayBuffer(44 + 2 * count), head = new DataView(wav);
   const text = (at, letters) => [...letters].forEach((c, i) => head.setUint8(at + i, c.charCodeAt(0)));
@@ -24,7 +25,7 @@ function wavOf(sound) {
   return wav;
 }
 
-// Runs one request in a worker of its own. Null if it was stopped.
+// Runs one request in a new worker. Returns null if it was stopped.
 function work(request, transfer = []) {
   const worker = new Worker(code);
   return new Promise((resolve) => {
@@ -103,7 +104,7 @@ function add(files) {
   run();
 }
 
-// The page of --report with this song's data.
+// Shows the page of --report with this song's data.
 function show(entry) {
   if (shown) URL.revokeObjectURL(shown.song.audio);
   shown = entry;

@@ -14,7 +14,7 @@
 failure check_file(const std::string &path);
 
 // Returns the reason for a failure of tavo_init with code. path: as passed to the library. Stores
-// what is known of the stream in result.
+// the known properties of the stream in result.
 failure explain_refusal(const std::string &path, int32_t code, record &result);
 
 // Refuses a file that states a longer duration than the user allows.

@@ -21,7 +21,7 @@
 
 namespace {
 
-constexpr size_t kStepsAtOnce = 64;  // files and folders looked at between two looks at the stop
+constexpr size_t kStepsAtOnce = 64;  // files and folders between two checks for a stop
 
 void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
@@ -31,8 +31,8 @@ file_id id_of(const struct stat &info) {
     return {info.st_dev, info.st_ino};
 }
 
-// Claims the marker file or clip of an input, so that no other input writes the same one. False
-// leaves the input out.
+// Claims the marker file or clip of an input, so that no other input writes the same file. Returns
+// false if the input is to be skipped.
 bool claim_target(input_supply &supply, input &entry, const std::string &target) {
     const std::string name = base_name(target);
     struct stat info {};
@@ -41,7 +41,7 @@ bool claim_target(input_supply &supply, input &entry, const std::string &target)
         return false;
     }
     if (stat((target.substr(0, target.size() - name.size()) + ".").c_str(), &info) != 0) {
-        return true;  // writing will tell
+        return true;  // a failure is reported when the file is written
     }
     const std::string key =
         std::to_string(info.st_dev) + "/" + std::to_string(info.st_ino) + "/" + name;
@@ -64,7 +64,7 @@ bool claim_targets(input_supply &supply, input &entry) {
            (opts.clip.empty() || claim_target(supply, entry, clip_path(entry.path, opts)));
 }
 
-// Adds a folder's entries, unless this search has entered it before, through another link.
+// Adds the entries of a folder, unless this search has already entered it through another link.
 failure enter_folder(input_supply &supply, const std::string &path, const struct stat &info) {
     if (!supply.searched.insert(id_of(info)).second) return {};
     std::vector<std::string> entries;
@@ -74,12 +74,12 @@ failure enter_folder(input_supply &supply, const std::string &path, const struct
         entries.push_back(entry->path());
     }
     if (code) return {system_sentence("The folder cannot be read", code.value())};
-    std::sort(entries.begin(), entries.end(), std::greater<>());  // the order of their bytes
+    std::sort(entries.begin(), entries.end(), std::greater<>());  // by bytes
     std::move(entries.begin(), entries.end(), std::back_inserter(supply.entries));
     return {};
 }
 
-// True if the folder becomes an input, because it holds no audio.
+// True if the folder becomes an input because it contains no audio.
 bool leave_folder(input_supply &supply, input &out) {
     const std::string path = std::exchange(supply.folder, "");
     if (supply.found == 0) {
@@ -95,7 +95,7 @@ bool leave_folder(input_supply &supply, input &out) {
     return false;
 }
 
-// True if the file is to be analysed or reported. Sets refusal if it cannot be read.
+// True if the file must be analysed or reported. code receives errno if it cannot be read.
 bool is_audio(const std::string &path, const options &opts, failure &refusal) {
     file_kind kind = file_kind::unknown;
     if (const int code = recognise(path, kind)) {
@@ -104,14 +104,14 @@ bool is_audio(const std::string &path, const options &opts, failure &refusal) {
     }
     if (kind != file_kind::unknown) return true;
     if (!opts.ffmpeg.empty() && has_media_suffix(path)) return true;
-    // The library finds MPEG audio also after other bytes.
+    // The library also finds MPEG audio after other bytes.
     short_path opened = open_short_path(path);
     const int32_t probed = tavo_probe(opened.path.c_str(), nullptr);
     close_short_path(opened);
     return probed != TAVO_ERR_FORMAT && probed != TAVO_ERR_READ;
 }
 
-// The functions below look at one name and return true if they found an input.
+// Each function below examines one name and returns true if it found an input.
 
 bool look_at_entry(input_supply &supply, input &out) {
     if (supply.entries.empty()) return leave_folder(supply, out);
@@ -187,7 +187,7 @@ supply_state next_input(input_supply &supply, input &out) {
         if (look_at_next(supply, out)) {
             if (out.refusal || claim_targets(supply, out)) return supply_state::ready;
         } else if (is_list && supply.folder.empty() && supply.list.fd >= 0) {
-            return supply_state::waiting;  // for the next name
+            return supply_state::waiting;  // for a name
         }
     }
     if (supply.existing > 0) {

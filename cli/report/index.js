@@ -1,8 +1,9 @@
-// Sorts the songs by a column and shows those whose name holds what is sought.
+// Sorts the songs by a column and filters them by name.
 const body = document.querySelector("#songs tbody");
 const heads = [...document.querySelectorAll("#songs thead th")];
 
-// A cell's data-value is a number; without one its text decides. Songs without a value come last.
+// A cell's data-value is a number. A cell without one is sorted by its text. Songs without a value
+// come last.
 function compare(column, sign) {
   return (a, b) => {
     const [x, y] = [a.cells[column], b.cells[column]];

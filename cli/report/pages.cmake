@@ -1,11 +1,11 @@
-# report_pages.cpp: the two pages of --report, their style and scripts inside, as strings.
+# Generates report_pages.cpp: the two pages of --report, with their style and scripts, as strings.
 set(here ${CMAKE_CURRENT_LIST_DIR})
 set(parts page.css song.html shared.js song.js index.html index.js)
 list(TRANSFORM parts PREPEND ${here}/)
 set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${parts})
 set(report_pages ${CMAKE_CURRENT_BINARY_DIR}/report_pages.cpp)
 
-# Keys that the command fills stay as they are.
+# Keys that the command replaces are kept.
 foreach(key TITLE DATA ROWS)
   set(${key} "@${key}@")
 endforeach()

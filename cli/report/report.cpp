@@ -23,7 +23,7 @@ namespace fs = std::filesystem;
 constexpr int kMiniatureWidth = 140;
 constexpr int kMiniatureHeight = 28;
 
-// The template with the first key replaced.
+// Returns the template with the first key replaced.
 std::string filled(std::string page, const std::string &key, const std::string &value) {
     const size_t at = page.find(key);
     return at == std::string::npos ? page : page.replace(at, key.size(), value);
@@ -46,7 +46,7 @@ std::string base64(const std::string &bytes) {
     return out;
 }
 
-// JSON that may stand inside a script element.
+// Returns JSON that is safe inside a script element.
 std::string script_json(const result_json &value) {
     std::string text = value.dump();
     for (size_t at = text.find('<'); at != std::string::npos; at = text.find('<', at)) {
@@ -55,7 +55,7 @@ std::string script_json(const result_json &value) {
     return text;
 }
 
-// Adds the sound for the page at page_path: the bytes of the file, or its relative URL.
+// Adds the sound to the page at page_path: the bytes of the file, or its relative URL.
 failure add_sound(const std::string &song_path, const std::string &page_path, bool embed,
                   result_json &view) {
     if (embed) {
@@ -83,7 +83,7 @@ std::string number_cell(const std::string &text, double value) {
            text + "</td>\n";
 }
 
-// The loudness curve as a small picture.
+// Draws the loudness curve as a small picture.
 std::string miniature(const std::vector<float> &loudness) {
     if (loudness.size() < 2) return "";
     const auto top = static_cast<double>(*std::max_element(loudness.begin(), loudness.end()));
@@ -118,12 +118,12 @@ std::string index_row(const record &result, const result_json &view, const std::
            miniature(view["loudness"]) + "</td></tr>\n";
 }
 
-// The folder of the songs' pages beside the index.
+// Path of the folder of the songs' pages, beside the index.
 std::string pages_folder(const options &opts) {
     return fs::path(opts.report).replace_extension().string() + "_songs";
 }
 
-// The page of the index before or after its rows.
+// Returns the part of the index page before or after its rows.
 std::string index_part(bool is_before) {
     const std::string page = kIndexPage;
     const std::string key = "@ROWS@";
@@ -158,7 +158,7 @@ failure write_report_page(const record &result, const options &opts, const std::
     const std::string page = base_name(pages_folder(opts)) + "/" + base_name(target);
     row = index_row(result, view, page);
     if (failure failed = add_sound(result.file, target, opts.embed, view)) return failed;
-    // In this order no text of a song is mistaken for a key: the title comes before the data.
+    // The title is replaced before the data, so that no text of a song is mistaken for a key.
     const std::string with_data = filled(kSongPage, "@DATA@", script_json(view));
     const std::string title = html_text(base_name(result.file));
     return write_file(target, filled(with_data, "@TITLE@", title), opts.force);

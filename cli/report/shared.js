@@ -1,7 +1,7 @@
 "use strict";
 const byId = (id) => document.getElementById(id);
 
-// m:ss.t, with hours when there are any.
+// Formats a time as m:ss.t, with hours if needed.
 function clock(ms) {
   const tenths = Math.max(0, Math.round(ms / 100));
   const [h, m, s] = [tenths / 36000, tenths / 600 % 60, tenths / 10 % 60].map(Math.floor);

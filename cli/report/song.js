@@ -36,7 +36,7 @@ function drawLoudness() {
   byId("loudname").hidden = song.loudness.length === 0;
   const top = Math.max(...song.loudness, song.mean, 1e-9);
   const y = (value) => (79 - value / top * 29).toFixed(2);
-  // A value is drawn in the middle of its window of 6 s.
+  // Each value is drawn in the middle of its window of 6 s.
   const points = song.loudness.map((value, k) => `${song.sound_ms + 2000 * k + 3000} ${y(value)}`);
   if (points.length === 0) return;
   shape("path", { class: "loud", d: "M" + points.join("L") });
@@ -72,14 +72,14 @@ function drawTicks() {
   for (let t = Math.ceil(view.from / step) * step; t <= view.to; t += step) {
     const label = element("span", step < 1000 ? clock(t) : clock(t).replace(/\.\d$/, ""));
     const x = timeline.clientWidth * (t - view.from) / span;
-    label.style.left = `${Math.min(timeline.clientWidth - 18, Math.max(18, x))}px`;  // half a label
+    label.style.left = `${Math.min(timeline.clientWidth - 18, Math.max(18, x))}px`;  // half the width of a label
     ticks.push(label);
   }
   byId("times").replaceChildren(...ticks);
 }
 
-// ---- The picture as a file: what the view shows, in pixels and with its colours as attributes, so
-// that every program draws it alike.
+// ---- Exports the picture as a file: the visible part, with sizes in pixels and colours as
+// attributes, so that every program draws it the same way.
 
 function pictureSvg() {
   const width = 1200, height = 360, top = 34, bottom = 330;
@@ -194,8 +194,8 @@ const embedded = {
 const player = song.embedded ? embedded : linked;
 if (!song.embedded) audio.src = song.audio;
 
-let scheduled = [];  // click nodes that may still sound
-let clickedTo = 0;   // beats up to here have their click
+let scheduled = [];  // click nodes that may not have ended
+let clickedTo = 0;   // beats before this one have their click
 
 function dropClicks() {
   for (const node of scheduled) node.stop();

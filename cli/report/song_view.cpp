@@ -17,8 +17,8 @@
 namespace {
 
 constexpr int32_t kBlockSamples = 4096;
-constexpr size_t kColumns = 4000;    // of the time axis: sharp when zoomed, about 30 KB
-constexpr size_t kMostBins = 16384;  // several per column, so that edges stay sharp
+constexpr size_t kColumns = 4000;    // columns of the time axis: sharp when zoomed, about 30 KB
+constexpr size_t kMostBins = 16384;  // several per column, for sharp edges
 constexpr double kHopMs = int{TAVO_LOUDNESS_HOP_MS};
 constexpr double kWindowMs = int{TAVO_LOUDNESS_WINDOW_MS};
 constexpr size_t kWindowHops = TAVO_LOUDNESS_WINDOW_MS / TAVO_LOUDNESS_HOP_MS;
@@ -31,12 +31,12 @@ struct extent {
 
 struct sound {
     int64_t samples = 0;
-    std::vector<extent> bins;  // of equally long spans
+    std::vector<extent> bins;  // equally long
     int64_t samples_per_bin = 1;
-    extent bin;  // the one that is not complete
+    extent bin;  // incomplete
     int64_t bin_samples = 0;
     std::vector<double> hops;  // sums of the squares of complete hops
-    double hop = 0.0;          // of the one that is not complete
+    double hop = 0.0;          // of the incomplete hop
     int64_t hop_samples = 0;
 };
 
@@ -44,8 +44,8 @@ extent merged(const extent &a, const extent &b) {
     return {std::min(a.low, b.low), std::max(a.high, b.high)};
 }
 
-// Doubles the span of the bins when there are too many: the duration that a file states, which
-// could say how many there will be, may be wrong.
+// Doubles the length of the bins when there are too many. Their number is not known before, because
+// the duration stated by a file may be wrong.
 void close_bin(sound &song) {
     song.bins.push_back(song.bin);
     song.bin = {};
@@ -91,8 +91,8 @@ failure read_samples(const std::string &path, int64_t samples_per_hop, int stop_
                             : failure{"The sound could not be read again for the page."};
 }
 
-// The bins as columns of a time axis. A column covers every bin that it overlaps; there are none
-// after the last sample.
+// Converts the bins to columns of a time axis. A column covers every bin that it overlaps. No
+// column is after the last sample.
 std::vector<extent> columns_of(const sound &song, double axis_samples) {
     const double bins_per_column =
         axis_samples / kColumns / static_cast<double>(song.samples_per_bin);
@@ -122,7 +122,7 @@ result_json wave_of(const std::vector<extent> &columns) {
     return wave;
 }
 
-// By the formula of tavo_get_loudness. A window consists of whole hops.
+// Uses the formula of tavo_get_loudness. A window consists of whole hops.
 std::vector<float> loudness_of(const sound &song, int64_t samples_per_hop) {
     std::vector<float> values;
     const auto samples = static_cast<double>(samples_per_hop) * kWindowHops;
@@ -134,14 +134,14 @@ std::vector<float> loudness_of(const sound &song, int64_t samples_per_hop) {
     return values;
 }
 
-// The start and the end of the span in which a highlight can be found, in ms. loudness: the number
-// of values.
+// Returns start and end, in ms, of the part of the song in which a highlight can be found.
+// loudness: number of values.
 result_json searched_span(const record &result, size_t loudness) {
     const bool is_short = result.duration_ms / 1000 < TAVO_SHORT_SONG_S;
     const int skip = is_short ? 0 : TAVO_SEARCH_SKIP;
     const int tail = is_short ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
     const double start = skip * kHopMs;
-    // The last window that is searched may have its rise at its very end.
+    // The last window that is searched may have its rise at its end.
     const double last = static_cast<double>(loudness) - tail;
     const double end = last < 0.0 ? start : last * kHopMs + kWindowMs;
     return {player_ms(result, start), player_ms(result, std::max(start, end))};

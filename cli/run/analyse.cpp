@@ -19,8 +19,8 @@
 
 namespace {
 
-// Mean square to which --normalize raises the loudest 6 s, full scale 1: -8 dBFS, at which the
-// library refines a highlight after any rise of 3 dB.
+// Mean square that --normalize gives the loudest 6 s, full scale 1: -8 dBFS. At this level the
+// library refines the highlight after any rise of 3 dB.
 constexpr double kRaisedPower = 0.1585;
 
 // The end of a job, set on the job's thread.
@@ -57,7 +57,7 @@ double loudest_passage(const TAVO_CTX *ctx) {
     return std::pow(10.0, *std::max_element(curve, curve + count) / 10.0) - 1.0;
 }
 
-// Call it after the callback, when the job no longer changes the instance.
+// Must be called after the callback, when the job no longer changes the instance.
 void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
     if (tavo_has_audio(ctx) == 0) {
         out.error = "No audio could be decoded from the file.";
@@ -114,8 +114,8 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
 
 void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out);
 
-// Replaces a coarse highlight by that of the song raised in level. Mode both does not show whether
-// its highlight is coarse, so there the song is searched again.
+// Replaces a coarse highlight by that of the amplified song. In mode both the result does not show
+// whether the highlight is coarse, so the song is searched again.
 void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record &out) {
     options search = opts;
     search.mode = TAVO_MODE_HIGHLIGHT;
@@ -169,7 +169,7 @@ void analyse_opened(const options &opts, int stop_fd, song_file &song, record &o
     if (is_readable(stop_fd)) out.status = outcome::stopped;
 }
 
-// Processor time of this process, all threads, and of its ffmpeg processes, user and system.
+// Processor time of this process and its ffmpeg processes, all threads, user and system.
 int64_t cpu_time_ms() {
     int64_t sum = 0;
     for (const auto who : {RUSAGE_SELF, RUSAGE_CHILDREN}) {

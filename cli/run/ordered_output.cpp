@@ -21,7 +21,7 @@ void write_result(ordered_output &output, const std::string &text) {
     if (code != EPIPE) output.write_error = code;
 }
 
-// A part of the index could not be written.
+// Records that part of the index could not be written.
 void note_index_failure(ordered_output &output, const failure &failed) {
     if (!failed) return;
     output.a_file_failed = true;

@@ -1,4 +1,4 @@
-// Writes replies in the order of the inputs, in whatever order they arrive: results to standard
+// Writes replies in the order of the inputs, although they arrive in any order: results to standard
 // output, messages to standard error. Clears the progress line first.
 #ifndef TAVO_CLI_RUN_ORDERED_OUTPUT_H
 #define TAVO_CLI_RUN_ORDERED_OUTPUT_H
@@ -15,19 +15,19 @@
 #include "cli/run/progress.h"
 
 struct ordered_output {
-    std::map<size_t, reply> waiting;  // until earlier inputs have theirs
-    size_t next = 0;                  // input to write
-    size_t total = 0;                 // inputs; 0 while not all are known
+    std::map<size_t, reply> waiting;  // replies that wait for those of earlier inputs
+    size_t next = 0;                  // index of the next input to write
+    size_t total = 0;                 // number of inputs, or 0 if not all are known yet
     size_t done = 0;                  // replies of analyses that were not stopped
     bool a_file_failed = false;
-    bool reader_gone = false;  // standard output was closed by its reader
+    bool reader_gone = false;  // the reader of standard output has closed it
     int write_error = 0;       // errno of any other failure on standard output
     output_file index;         // of the pages
-    bool to_pipe = false;      // standard output is a pipe, whose reader may end
+    bool to_pipe = false;      // standard output is a pipe, whose reader may end before the command
     progress bar;
 };
 
-// Fails if the report's index cannot be begun.
+// Fails if the report's index cannot be created.
 failure start_output(ordered_output &output, const options &opts);
 void accept_reply(ordered_output &output, size_t index, reply &&answer);
 void write_message(ordered_output &output, const std::string &text);

@@ -23,7 +23,7 @@ void on_signal(int number) {
     errno = saved;
 }
 
-// Returns the handler before.
+// Returns the previous handler.
 sighandler_t set_handler(int number, sighandler_t handler) {
     struct sigaction action {};
     struct sigaction before {};
@@ -39,7 +39,7 @@ bool watch_for_stop() {
     wake_fd = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
     if (wake_fd < 0) return false;
     for (const int number : kSignals) {
-        // A command that nohup starts goes on after a SIGHUP.
+        // A command started by nohup continues after a SIGHUP.
         const bool was_ignored = set_handler(number, on_signal) == SIG_IGN;
         if (was_ignored && number == SIGHUP) set_handler(number, SIG_IGN);
     }

@@ -26,8 +26,8 @@ namespace {
 
 // Bytes.
 constexpr int kHeapAtStart = 28 << 20;       // the buffers of a song of three minutes
-constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get mappings of their own
-constexpr int kLargestThreshold = 32 << 20;  // that malloc accepts
+constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappings
+constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
 constexpr int kFreeMemoryKept = 64 << 20;
 
 // Returns the stored result, or analyses the file.
@@ -49,7 +49,7 @@ record find_result(const request &message, const options &opts, int stop_fd, son
     return out;
 }
 
-// True if results go into a store.
+// True if results go to a store.
 bool is_stored(const options &opts) {
     return !opts.store.empty() && !opts.from_store;
 }
@@ -62,7 +62,7 @@ bool has_content(const std::string &path, const std::string &content) {
 
 failure write_markers(record &result, const options &opts, const std::string &target) {
     const std::string content = marker_content(result, opts);
-    // A command that was killed before it committed the row has left the file.
+    // A command that was killed before it committed the row may have left the file.
     if (!is_stored(opts) || !has_content(target, content)) {
         if (failure failed = write_file(target, content, opts.force)) return failed;
     }
@@ -70,7 +70,7 @@ failure write_markers(record &result, const options &opts, const std::string &ta
     return {};
 }
 
-// The files that are written besides the result. A path is empty if the file was not asked for.
+// Files written in addition to the result. A path is empty if its file was not requested.
 struct side_files {
     std::string page;
     std::string markers;
@@ -85,11 +85,11 @@ side_files find_side_files(const request &message, const options &opts) {
     return out;
 }
 
-// Checks before the analysis that the files can be written.
+// Checks, before the analysis, that the files can be written.
 failure check_side_files(const side_files &files, const options &opts) {
     failure failed;
     if (!files.page.empty()) failed = check_report(files.page, opts.force);
-    // With a store an existing file may be this song's: write_markers compares.
+    // With a store an existing file may be this song's, so write_markers compares it.
     const bool may_exist = opts.force || is_stored(opts);
     if (!failed && !files.markers.empty()) failed = check_target(files.markers, may_exist);
     if (!failed && !files.clip.empty()) failed = check_target(files.clip, opts.force);
@@ -124,7 +124,7 @@ reply analyse_and_write(const request &message, const options &opts, int stop_fd
     }
     reply out = make_reply(result, opts);
     if (result.status == outcome::ok) out.row = row;
-    // The store does not record that only a file could not be written.
+    // The store does not record a failure to write a file.
     if (failed) out.json.clear();
     return out;
 }
@@ -144,7 +144,7 @@ std::string serve(const request &message, const options &opts, int stop_fd) {
 // starts large enough for a song, in huge pages: one page fault instead of 512.
 void prepare_heap() {
     mallopt(M_TRIM_THRESHOLD, kFreeMemoryKept);
-    mallopt(M_MMAP_THRESHOLD, kLargestThreshold);  // the block below comes from the heap
+    mallopt(M_MMAP_THRESHOLD, kLargestThreshold);  // so that the block below is part of the heap
     const auto page = static_cast<size_t>(sysconf(_SC_PAGESIZE));
     void *block = nullptr;
     if (posix_memalign(&block, page, kHeapAtStart) == 0) {
@@ -161,7 +161,7 @@ reply make_reply(const record &result, const options &opts) {
     out.status = result.status;
     out.result = format_record(opts, result);
     const std::string line = shown(result.file) + ": " + result.error + "\n";
-    if (opts.failed) {  // a failure that the store holds is a result here
+    if (opts.failed) {  // here a stored failure is a result
         out.status = outcome::ok;
         if (opts.format == result_format::text) out.result = line;
     } else if (result.status == outcome::failed) {

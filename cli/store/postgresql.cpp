@@ -12,7 +12,7 @@ constexpr Oid kBytesOid = 17;  // of the server's types, fixed for all versions
 constexpr Oid kBigintOid = 20;
 constexpr Oid kIntegerOid = 23;
 
-// The server's text in one line.
+// Returns the server's text in one line.
 std::string sentence(const char *words) {
     std::string text = words;
     while (!text.empty() && text.back() == '\n') text.pop_back();
@@ -20,8 +20,8 @@ std::string sentence(const char *words) {
     return text;
 }
 
-// Errors of the connection, of concurrent transactions, resources and locks, and of a server that
-// shuts down are temporary. Without a code the connection was lost.
+// True unless the error is temporary: an error of the connection, of concurrent transactions,
+// resources or locks, or of a server that shuts down. Without a code the connection was lost.
 bool is_permanent(const char *sql_state) {
     if (sql_state == nullptr) return false;
     const std::string_view code_class(sql_state, 2);
@@ -56,7 +56,7 @@ cell column(const PGresult *result, int line, int index) {
 failure run(void *handle, const std::string &sql, const row &values,
             const std::function<void(const row &)> &on_row) {
     auto *connection = static_cast<PGconn *>(handle);
-    // In the form of the protocol: numbers and text as text, bytes unchanged.
+    // Values in the protocol's format: numbers and text as text, bytes unchanged.
     std::vector<std::string> texts(values.size());
     std::vector<const char *> data(values.size());
     std::vector<int> sizes(values.size());
@@ -99,10 +99,10 @@ void disconnect(void *handle) {
     PQfinish(static_cast<PGconn *>(handle));
 }
 
-// An index entry can have a third of a page of 8 KiB.
+// An index entry is limited to a third of a page of 8 KiB.
 constexpr database_kind kPostgresql = {
     "BYTEA", "TIMESTAMPTZ", "date_trunc('second', now())", "JSON", 2600,
-    // Reading pg_class makes the server notice a table that another command has just made.
+    // Reading pg_class makes the server notice a table that another command has just created.
     "SELECT coalesce((SELECT substring(obj_description(oid, 'pg_class') FROM 'version ([0-9]+)') "
     "FROM pg_class WHERE oid = to_regclass('songs')), '0')::int",
     "COMMENT ON TABLE songs IS 'tavo, version %d'",

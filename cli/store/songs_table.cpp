@@ -15,7 +15,7 @@ using nlohmann::json;
 
 enum class column_type { text, whole, real, list };  // list: of numbers, as JSON
 
-// A column with a part of the result, and the part's key in JSON.
+// A column for a part of the result, and the part's key in JSON.
 struct result_column {
     const char *name;
     const char *key;
@@ -68,7 +68,7 @@ json value_of(const cell &value, column_type type) {
     if (number != nullptr) return is_number ? json(*number) : damaged;
     if (text == nullptr || type == column_type::whole) return damaged;
     if (type == column_type::text) return as_utf8(*text);
-    // Nested lists are not parsed, so that their depth costs nothing.
+    // Nested lists are not parsed, so that their depth has no cost.
     const size_t last_bracket = text->find_last_of("[{");
     if (last_bracket != std::string::npos && last_bracket > 0) return damaged;
     const json parsed = json::parse(*text, nullptr, false);

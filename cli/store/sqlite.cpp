@@ -9,7 +9,7 @@
 
 namespace {
 
-constexpr int kBusyMs = 2000;  // wait while another process writes to the file
+constexpr int kBusyMs = 2000;  // maximum wait while another process writes to the file
 
 bool is_permanent(int code) {
     constexpr int kTemporary[] = {SQLITE_BUSY, SQLITE_LOCKED, SQLITE_CANTOPEN, SQLITE_IOERR,
@@ -23,7 +23,8 @@ int connect(const std::string &name, int flags, sqlite3 **db) {
     int code = sqlite3_open_v2(name.c_str(), db, flags, nullptr);
     if (code != SQLITE_OK) return code;
     sqlite3_busy_timeout(*db, kBusyMs);
-    // With a write-ahead log others can read meanwhile, and a kill at any moment is harmless.
+    // With a write-ahead log others can read at the same time, and a kill at any moment does no
+    // damage.
     const char *first = (flags & SQLITE_OPEN_READONLY) != 0
                             ? "SELECT count(*) FROM sqlite_master"
                             : "PRAGMA journal_mode=WAL; PRAGMA synchronous=NORMAL";

@@ -24,7 +24,7 @@ constexpr int64_t kFirstWaitMs = 500;  // doubled each time
 constexpr int64_t kLongestWaitMs = 30'000;
 constexpr int64_t kPageRows = 500;
 
-// The four values of the key, in order.
+// Returns the four values of the key, in order.
 row key_of(const store &db, const std::string &path) {
     return {bytes{path}, std::string(mode_word(db.opts.mode)), int64_t{db.opts.length_s},
             int64_t{db.opts.max_beats}};
@@ -85,7 +85,7 @@ failure read_version(store &db) {
     });
 }
 
-// Makes the table or adds the columns that it lacks, all or nothing.
+// Creates the table or adds missing columns, in one transaction.
 failure upgrade(store &db) {
     failure failed = run(db, db.kind->begin_upgrade);
     if (!failed) failed = read_version(db);  // another command may have upgraded it meanwhile

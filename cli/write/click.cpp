@@ -15,7 +15,7 @@
 
 namespace {
 
-// The library ignores write errors: a full disk shows only in the length.
+// The library ignores write errors, so a full disk only shows in the length.
 bool is_whole_track(const std::string &path) {
     std::ifstream file(path, std::ios::binary);
     file.seekg(40);  // the last field of the WAV header: the size of the data, little-endian

@@ -12,10 +12,10 @@
 
 namespace {
 
-constexpr const char *kBitRate = "192k";  // of encodings that take one
+constexpr const char *kBitRate = "192k";  // of lossy encodings
 
-// The kind of a clip by that of its input. A clip in ADTS, MPEG Layer II, AC-3, Windows Media,
-// Matroska or WebM would start late, because ffmpeg states no encoder delay there.
+// Chooses the kind of a clip by the kind of its input. A clip in ADTS, MPEG Layer II, AC-3, Windows
+// Media, Matroska or WebM would start late, because ffmpeg states no encoder delay there.
 struct audio_ending {
     const char *input;
     const char *clip;

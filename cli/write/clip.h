@@ -12,12 +12,12 @@
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// The clip of an input: opts.clip, or a file of its own in that folder, with the ending of the
-// input's kind of audio.
+// Returns the path of an input's clip: opts.clip, or a file in that folder with the extension of
+// the input's kind of audio.
 std::string clip_path(const std::string &input, const options &opts);
 
-// Writes opts.length_s seconds from the highlight on, at the player's time, with opts.fade_s
-// seconds of fade at either end. After a failure target is as before.
+// Writes opts.length_s seconds from the highlight on, at the player's time, with fades of
+// opts.fade_s seconds at both ends. A failure is stored in result; target is then unchanged.
 failure write_clip(const record &result, const options &opts, const std::string &target,
                    int stop_fd, const song_file &song);
 

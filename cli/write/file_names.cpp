@@ -18,14 +18,14 @@ namespace fs = std::filesystem;
 
 constexpr const char *kReplacement = "\xEF\xBF\xBD";  // U+FFFD
 
-// A character in UTF-8, or a byte that is not part of one.
+// A character in UTF-8, or a single byte that is not part of one.
 struct character {
     std::string_view bytes;
     uint32_t point = 0;
     bool is_valid = false;
 };
 
-// The character at the start of text. Overlong forms and surrogates are not valid.
+// Returns the character at the start of text. Overlong forms and surrogates are not valid.
 character first_character(std::string_view text) {
     constexpr uint32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};  // by length
     const auto lead = static_cast<uint8_t>(text[0]);
@@ -52,8 +52,8 @@ void for_each_character(std::string_view text,
     }
 }
 
-// Characters that move the cursor or reorder the text of a terminal: control characters, line
-// separators, and marks of the writing direction.
+// True for a character that moves the cursor or reorders text on a terminal: control characters,
+// line separators, and marks of the writing direction.
 bool is_control(uint32_t point) {
     struct range {
         uint32_t first, last;

@@ -20,7 +20,7 @@ std::string beats_lines(const record &result) {
 }
 
 std::string text_record(const record &result) {
-    if (result.status != outcome::ok) return "";  // the message on standard error says it
+    if (result.status != outcome::ok) return "";  // standard error has the message
     std::string text = shown(result.file) + "\n  stream     " +
                        clock_text(static_cast<double>(result.duration_ms)) + ", " +
                        std::to_string(result.sample_rate) + " Hz, " +
@@ -54,7 +54,7 @@ std::string format_record(const options &opts, const record &result) {
             if (result.status != outcome::ok) return "";
             // The template was checked with the options.
             return fill_template(opts.print, result, filled) ? "" : filled;
-        case result_format::markers:  // the name of the file written
+        case result_format::markers:  // name of the written file
             return result.written.empty() ? "" : shown(result.written) + "\n";
         default:
             return "";

@@ -8,10 +8,10 @@
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// The text before the first record; empty for most formats.
+// Returns the text before the first record; empty for most formats.
 std::string format_head(result_format format);
 
-// One record; empty when the format has nothing to say about it on standard output.
+// Returns the text of one record; empty if the format does not print it.
 std::string format_record(const options &opts, const record &result);
 
 // Appends the text with each {field} replaced, and with \n, \t and other escaped characters. Fails

@@ -9,14 +9,14 @@
 
 namespace {
 
-// In the order of the columns: keys of json_object.
+// Keys of json_object, in the order of the columns.
 constexpr const char *kColumns[] = {"file",      "mode",        "status",    "sample_rate",
                                     "channels",  "duration_ms", "offset_ms", "hl_pos_ms",
                                     "hl_end_ms", "hl_refined",  "bpm",       "beat_count",
                                     "beats_ms",  "cpu_ms",      "error"};
 
-// Quoted where the cell needs it. Names go out byte for byte, whatever their encoding, except to a
-// terminal. Programs read this format: a name that begins with = + - @ stays as it is.
+// Quotes the text if necessary. Names are written byte for byte, whatever their encoding, except to
+// a terminal. The format is for programs, so a name that begins with = + - @ is not changed.
 std::string quoted(const std::string &text) {
     const std::string value = isatty(STDOUT_FILENO) == 1 ? shown(text) : text;
     if (value.find_first_of(",\"\r\n") == std::string::npos) return value;
@@ -28,7 +28,7 @@ std::string quoted(const std::string &text) {
     return out + "\"";
 }
 
-// The shortest decimal that gives the same float again.
+// Returns the shortest decimal that converts back to the same float.
 std::string number_text(float value) {
     std::array<char, 64> text{};
     const auto end =
@@ -55,7 +55,7 @@ std::string csv_head() {
 
 std::string csv_record(const record &result) {
     result_json object = json_object(result);
-    object["file"] = result.file;  // its exact bytes
+    object["file"] = result.file;  // exact bytes
     std::string row;
     for (const char *name : kColumns) {
         if (name != kColumns[0]) row += ",";

@@ -1,4 +1,4 @@
-// --print: a line of the user's own making for each song.
+// --print: a text that the user specifies, for each song.
 #include <unistd.h>
 
 #include <algorithm>
@@ -17,7 +17,7 @@ std::string seconds(double ms) {
     return formatted("%.3f", ms / 1000.0);
 }
 
-// To a terminal without control characters; else byte for byte.
+// Prints without control characters to a terminal, otherwise byte for byte.
 std::string name_text(const std::string &name) {
     return isatty(STDOUT_FILENO) == 1 ? shown(name) : name;
 }
@@ -30,7 +30,7 @@ std::string beat_times(const record &result) {
     return times;
 }
 
-// The fields with their values for a song; empty where it has none.
+// Returns the fields and a song's values, which are empty where the song has none.
 std::vector<std::pair<std::string, std::string>> fields_of(const record &result) {
     const double start = player_ms(result, result.hl_pos_ms);
     const double end = player_ms(result, region_end_ms(result));

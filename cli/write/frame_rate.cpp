@@ -15,15 +15,15 @@ constexpr frame_rate kRates[] = {
 };
 constexpr int64_t kStartMinutes = 60;  // the timecode of frame 0
 
-// Frame numbers left out at the start of a minute, unless it is a tenth one.
+// Frame numbers that drop-frame timecode skips at the start of each minute, except every tenth.
 int64_t dropped_a_minute(const frame_rate &rate) {
     return rate.drop ? rate.base / 15 : 0;
 }
 
-// Frame numbers from the start of the timecode to frame, those left out counted.
+// Returns the frame number of a frame, including the skipped numbers before it.
 int64_t number_of(int64_t frame, const frame_rate &rate) {
     const int64_t dropped = dropped_a_minute(rate);
-    const int64_t minute = 60LL * rate.base - dropped;  // frames of a minute
+    const int64_t minute = 60LL * rate.base - dropped;  // frames per minute
     const int64_t ten_minutes = 10 * minute + dropped;
     frame += kStartMinutes / 10 * ten_minutes;
     const int64_t tens = frame / ten_minutes;

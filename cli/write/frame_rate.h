@@ -7,24 +7,24 @@
 #include <vector>
 
 struct frame_rate {
-    const char *name;  // as --fps has it
-    int32_t frames;    // in so many seconds:
+    const char *name;  // as in --fps
+    int32_t frames;    // during these seconds:
     int32_t seconds;
-    int32_t base;  // frame numbers of a second in the timecode
-    bool drop;     // the timecode leaves out frame numbers, so that it keeps up with the clock
+    int32_t base;  // frame numbers per second of timecode
+    bool drop;     // the timecode skips frame numbers to match the clock
 };
 
-// Returns null for another name.
+// Returns null for any other name.
 const frame_rate *find_frame_rate(const std::string &name);
 
-// Their names, in order.
+// Returns the names of all rates, in order.
 std::vector<std::string> frame_rate_names();
 
-// The nearest frame.
+// Returns the nearest video frame.
 int64_t frame_at(double ms, const frame_rate &rate);
 
-// hh:mm:ss:ff, with a semicolon before the frames of a drop-frame timecode. Of a time line that
-// starts at one hour, as editors' do.
+// Formats a timecode hh:mm:ss:ff, with a semicolon before the frames for drop-frame timecode. The
+// time line starts at one hour, as those of editors do.
 std::string timecode(int64_t frame, const frame_rate &rate);
 
 #endif

@@ -4,7 +4,7 @@
 
 namespace {
 
-constexpr int32_t kUsualLengthSeconds = 30;  // marked without --length: a preview's
+constexpr int32_t kUsualLengthSeconds = 30;  // of a usual preview, if --length is not given
 
 }  // namespace
 

@@ -1,6 +1,6 @@
-// Marker files: what an editor imports, one file beside each song or in --output-dir.
+// Marker files for editors, one beside each song or in --output-dir.
 //
-// In: a record and the options. Out: the file's content, for worker_process.cpp to write.
+// In: a record and the options. Out: the file's content, which worker_process.cpp writes.
 #ifndef TAVO_CLI_WRITE_MARKERS_H
 #define TAVO_CLI_WRITE_MARKERS_H
 
@@ -11,38 +11,38 @@
 #include "cli/run/record.h"
 #include "cli/write/frame_rate.h"
 
-// The highlight, from its start to its end, or a beat, whose times are equal. Milliseconds as
-// players count them.
+// The highlight with its start and end, or a beat, whose times are equal. Milliseconds, player's
+// time.
 struct mark {
     double start_ms;
     double end_ms;
     std::string name;
 };
 
-// All marks of a song, the highlight first.
+// Returns all marks of a song, the highlight first.
 std::vector<mark> marks_of(const record &result);
 
-// The end of the highlight's region: after --length, or after what a preview usually lasts.
+// Returns the end of the highlight: its start plus --length, or plus the usual length of a preview.
 double region_end_ms(const record &result);
 
 struct marker_format {
     const char *word;    // of --format
-    const char *suffix;  // of the file's name, after the song's
-    bool drops_ending;   // the song's name loses its ending first
+    const char *suffix;  // of the file name, after the song's name
+    bool drops_ending;   // the extension of the song's name is removed first
     bool counts_frames;  // --fps applies
     std::string (*content)(const record &result, const frame_rate &rate);
 };
 
-// In the order of the help.
+// Ordered as in the help.
 const std::vector<marker_format> &marker_formats();
 
-// Returns null for another word.
+// Returns null for any other word.
 const marker_format *find_marker_format(const std::string &word);
 
-// The marker file of an input. A name too long for a file system is cut and numbered.
+// Path of the marker file of an input. A name too long for a file system is shortened and numbered.
 std::string marker_path(const std::string &input, const options &opts);
 
-// The file's whole content.
+// Returns the whole content of the file.
 std::string marker_content(const record &result, const options &opts);
 
 // The writers.

@@ -21,7 +21,7 @@ std::string element(const char *name, const attributes &values) {
     return opened(name, values) + "/>\n";
 }
 
-// A whole number of frames as a fraction of seconds.
+// Formats a number of video frames as a fraction of seconds.
 std::string frames_text(int64_t frames, const frame_rate &rate) {
     return std::to_string(frames * rate.seconds) + "/" + std::to_string(rate.frames) + "s";
 }

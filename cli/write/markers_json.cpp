@@ -1,4 +1,4 @@
-// Marker formats that are JSON.
+// Marker formats based on JSON.
 #include <algorithm>
 #include <cmath>
 #include <nlohmann/json.hpp>
@@ -37,7 +37,8 @@ json otio_markers(const record &result, const frame_rate &rate) {
 
 }  // namespace
 
-// LosslessCut's segments: the highlight, then one from each beat to the next or to the song's end.
+// Segments for LosslessCut: the highlight, then one from each beat to the next or to the end of the
+// song.
 std::string losslesscut_project(const record &result, const frame_rate & /*rate*/) {
     const std::vector<mark> marks = marks_of(result);
     json segments = json::array();
@@ -48,7 +49,7 @@ std::string losslesscut_project(const record &result, const frame_rate & /*rate*
                          ? marks[i + 1].start_ms
                          : player_ms(result, static_cast<double>(result.duration_ms));
         }
-        if (end_ms <= marks[i].start_ms) continue;  // two beats at one time
+        if (end_ms <= marks[i].start_ms) continue;  // two beats at the same time
         segments.push_back({{"start", std::round(marks[i].start_ms) / 1000.0},
                             {"end", std::round(end_ms) / 1000.0},
                             {"name", marks[i].name}});
@@ -59,7 +60,7 @@ std::string losslesscut_project(const record &result, const frame_rate & /*rate*
     return project.dump(2) + "\n";
 }
 
-// OpenTimelineIO: a time line with the song as its only clip, and markers on it.
+// OpenTimelineIO: a timeline with the song as its only clip and the markers on it.
 std::string otio_timeline(const record &result, const frame_rate &rate) {
     const std::string name = as_utf8(base_name(result.file));
     const double end_ms = player_ms(result, static_cast<double>(result.duration_ms));

@@ -1,4 +1,4 @@
-// Marker formats with a line or a few for each mark.
+// Marker formats with one or a few lines per mark.
 #include <algorithm>
 #include <cmath>
 
@@ -20,7 +20,7 @@ struct chapter {
     std::string title;
 };
 
-// Chapters follow each other without gaps, from the start of the song.
+// Chapters are contiguous and begin at the start of the song.
 std::vector<chapter> chapters_of(const record &result) {
     std::vector<chapter> chapters;
     for (const mark &entry : marks_of(result)) {
@@ -45,7 +45,7 @@ std::string audacity_labels(const record &result, const frame_rate & /*rate*/) {
     return out;
 }
 
-// A time, a space and the guide's comment. A guide is a point.
+// Each line has a time, a space and the comment of the guide. A guide is a point.
 std::string kdenlive_guides(const record &result, const frame_rate & /*rate*/) {
     std::string out;
     for (const mark &entry : marks_of(result)) {
@@ -54,7 +54,7 @@ std::string kdenlive_guides(const record &result, const frame_rate & /*rate*/) {
     return out;
 }
 
-// The table of the region and marker manager.
+// The table of Reaper's region and marker manager.
 std::string reaper_markers(const record &result, const frame_rate & /*rate*/) {
     std::string out = "#,Name,Start,End,Length\n";
     size_t regions = 0;

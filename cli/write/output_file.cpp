@@ -29,12 +29,12 @@ failure exists_already(const std::string &target) {
     return {"The file " + shown(target) + " exists already; --force overwrites it."};
 }
 
-// Without force, an existing target is an error. Returns 0 or errno.
+// Without force, an existing target is an error. Returns 0 or an errno value.
 int move_file(const std::string &from, const std::string &to, bool force) {
     if (force) return rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
     if (renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
     if (errno != EINVAL && errno != ENOSYS) return errno;
-    // A file system without that operation. A link, too, fails if the target exists.
+    // On a file system without that operation, link fails too if the target exists.
     if (link(from.c_str(), to.c_str()) != 0) return errno;
     unlink(from.c_str());
     return 0;
@@ -70,7 +70,7 @@ failure begin_output(output_file &file, const std::string &target, const std::st
     note_temporary_file(file.temporary);
     const mode_t mask = umask(0);
     umask(mask);
-    fchmod(file.fd, 0666 & ~mask);  // mkostemps' own permissions let nobody else read
+    fchmod(file.fd, 0666 & ~mask);  // mkostemps grants access only to the owner
     return {};
 }
 

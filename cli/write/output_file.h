@@ -9,28 +9,29 @@
 // A temporary file in the folder of the target, with the permissions of a new file.
 struct output_file {
     std::string target;
-    std::string temporary;  // empty when nothing is left to remove
-    int fd = -1;            // open for writing, -1 once closed
+    std::string temporary;  // empty if nothing is left to remove
+    int fd = -1;            // open for writing, or -1
 };
 
-// True if both paths lead to one existing file.
+// True if both paths refer to the same existing file.
 bool same_file(const std::string &a, const std::string &b);
 
 // Checks that the target can be written: its folder is writable and, without force, the target
 // does not exist. Creates nothing.
 failure check_target(const std::string &target, bool force);
 
-// ending: of the temporary file's name, for programs that go by it.
+// Creates the temporary file. ending: its extension, for programs that need one.
 failure begin_output(output_file &file, const std::string &target, const std::string &ending = "");
 failure write_output(output_file &file, const std::string &content);
 
-// Gives the file its name. Without force an existing target stays and the temporary is removed.
+// Renames the file to its target. Without force an existing target is kept and the temporary file
+// is removed.
 failure commit_output(output_file &file, bool force);
 
-// Removes what is left. Harmless after a commit and when called twice.
+// Removes the temporary file. Does nothing after a commit or a previous call.
 void abandon_output(output_file &file);
 
-// All of the above.
+// Writes a whole file with the functions above.
 failure write_file(const std::string &target, const std::string &content, bool force);
 
 #endif

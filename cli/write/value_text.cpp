@@ -74,7 +74,7 @@ std::string count_text(size_t count, const char *noun) {
 
 std::string system_sentence(const std::string &subject, int code) {
     std::string reason = std::generic_category().message(code);
-    // A capital is lowered, unless the word is an acronym.
+    // Makes the first letter lower case unless the word is an acronym.
     if (reason.size() > 1 && isupper(static_cast<unsigned char>(reason[0])) != 0 &&
         islower(static_cast<unsigned char>(reason[1])) != 0) {
         reason[0] = static_cast<char>(tolower(static_cast<unsigned char>(reason[0])));

@@ -7,28 +7,28 @@
 
 #include "cli/run/record.h"
 
-// printf into a string of at most 95 characters.
+// Formats like printf into a string of at most 95 characters.
 std::string formatted(const char *format, ...) __attribute__((format(printf, 1, 2)));
 
 // Words of the interface: highlight, beats, both; ok, failed, stopped.
 const char *mode_word(int32_t mode);
-int32_t mode_of(const std::string &word);  // TAVO_MODE_*; the words' inverse
+int32_t mode_of(const std::string &word);  // TAVO_MODE_*; the inverse of mode_word
 const char *status_word(outcome status);
 
-// m:ss.t, or h:mm:ss.t from an hour on; whole_clock_text leaves out the tenths.
+// Formats a time as m:ss.t, or as h:mm:ss.t from an hour on. whole_clock_text omits the tenths.
 std::string clock_text(double ms);
 std::string whole_clock_text(double ms);
 
-// "0:30.2 to 1:00.2"; "about 0:36" when the start is not refined.
+// "0:30.2 to 1:00.2"; "about 0:36" if the start is not refined.
 std::string highlight_text(const record &result);
 
-// "117 BPM", in mode both "117 BPM from the highlight on".
+// "117 BPM"; in mode both "117 BPM from the highlight on".
 std::string tempo_text(const record &result);
 
 // "1 file", "2 files".
 std::string count_text(size_t count, const char *noun);
 
-// "subject: reason of the system." from an errno value.
+// "subject: reason.", with the system's text for an errno value.
 std::string system_sentence(const std::string &subject, int code);
 
 #endif

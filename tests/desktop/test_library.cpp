@@ -17,8 +17,8 @@ bool has_libavcodec() {
     return load("/proc/self/maps").find("libavcodec") != std::string::npos;
 }
 
-// WAV and FLAC do not need libavcodec. Four sources that do open at the same time. If libavcodec is
-// loaded already, the test runs in a new process.
+// WAV and FLAC do not need libavcodec. Then four sources that need it are opened at the same time.
+// If libavcodec is loaded already, the test runs in a new process.
 TEST(Library, LoadsLibavcodecWhenNeeded) {
     if (has_libavcodec()) {
         const std::string self = std::filesystem::read_symlink("/proc/self/exe");
