@@ -8,7 +8,7 @@ _arguments -s -S \
   '(-l --length)'{-l+,--length=}'[length of the highlight wanted]:seconds:' \
   '--max-beats=[maximum number of threshold-selected beats]:number:' \
   '--max-minutes=[refuse audio that lasts longer]:number:' \
-  '(-j --jobs)'{-j+,--jobs=}'[files analysed at once]:number:' \
+  '(-j --jobs)'{-j+,--jobs=}'[files analysed in parallel]:number:' \
   '--timeout=[give up a file whose analysis takes longer]:number:' \
   '--normalize[refine the highlight of a quiet song]' \
   '--no-ffmpeg[decode nothing with the ffmpeg program]' \
@@ -17,7 +17,7 @@ _arguments -s -S \
   '--print=[write this text for each song]:text:' \
   '--fps=[frames a second for edl and fcpxml]:rate:(23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60)' \
   '--force[overwrite files that exist]' \
-  '--skip-existing[leave out inputs whose marker file exists]' \
+  '--skip-existing[skip inputs whose marker file exists]' \
   '--click=[write the sound with a click on every beat]:WAV file:_files' \
   '(-q --quiet)'{-q,--quiet}'[no progress bar and no notes]' \
   '(-r --recursive)'{-r,--recursive}'[search folders inside folders too]' \
