@@ -1,8 +1,9 @@
 #!/usr/bin/env bash
 # bench/compare.sh [-n PAIRS] [-m MODE] FILE...
 # Compares a whole analysis of each file with decoding the same file by ffmpeg. Runs them alternately in pairs and
-# prints the medians of wall time, processor time and peak memory, and the median ratios of the pairs. Uses
-# build/release/bin/tavo, or the command that TAVO names. Close other programs first.
+# prints a Markdown table of the medians of wall time, processor time and peak memory, and the median ratios of the
+# pairs. Uses build/release/bin/tavo, or the command that TAVO names. Close other programs
+# first; on a busy machine, rely on the ratios of processor time only.
 set -euo pipefail
 tavo=${TAVO:-$(dirname -- "${BASH_SOURCE[0]}")/../build/release/bin/tavo}
 exec python3 - "$tavo" "$@" <<'END'
@@ -38,7 +39,8 @@ def median(values):
     return statistics.median(values)
 
 
-print(f"{'file':24} {'wall s':>15} {'ratio':>6} {'CPU s':>15} {'ratio':>6} {'peak MiB':>9}")
+print("| File | Wall time, s | ratio | Processor time, s | ratio | Peak memory, MiB |")
+print("|---|---|---|---|---|---|")
 for file in args.files:
     pairs = []
     for _ in range(args.n + 1):
@@ -46,9 +48,10 @@ for file in args.files:
         pairs.append((job, measure(["ffmpeg", "-nostdin", "-y", "-i", file, "-ac", "1", "-f", "s16le",
                                     os.devnull])))
     pairs = pairs[1:]
-    row = f"{os.path.basename(file)[-24:]:24}"
+    row = f"| {os.path.basename(file)}"
     for i in (0, 1):
         job, other = (median([pair[k][i] for pair in pairs]) for k in (0, 1))
-        row += f" {job:7.3f}/{other:7.3f} {median([a[i] / b[i] for a, b in pairs]):6.2f}"
-    print(f"{row} {median([pair[0][2] for pair in pairs]):9.1f}", flush=True)
+        row += f" | {job:.3f} / {other:.3f} | {median([a[i] / b[i] for a, b in pairs]):.2f}"
+    print(f"{row} | {median([pair[0][2] for pair in pairs]):.1f} |", flush=True)
+print(f"\n{args.n} pairs, mode {args.m}, load average {os.getloadavg()[0]:.1f}")
 END
