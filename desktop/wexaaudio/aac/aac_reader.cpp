@@ -12,8 +12,7 @@ namespace {
 constexpr int32_t kHeaderBytes = 7;
 constexpr int32_t kCrcBytes = 2;
 constexpr int32_t kMaxFrameBytes = 8191;  // the length field has 13 bits
-constexpr uint32_t kProgramElement =
-    5;  // identifier of a program configuration element in a raw block
+constexpr uint32_t kProgramElement = 5;   // identifier of a program configuration element
 
 struct adts_header {
     int32_t object_type;
@@ -23,8 +22,7 @@ struct adts_header {
     int32_t bytes;  // of the compressed frame
 };
 
-// False if there is no header, or if it announces several raw blocks, whose lengths it does not
-// state.
+// False if there is no header, or if it announces several raw blocks without their lengths.
 bool header_at(io_file *file, int64_t offset, adts_header *h) {
     const uint8_t *p = io_file_bytes(file, offset, kHeaderBytes);
     if (p == nullptr || p[0] != 0xFF || (p[1] & 0xF6) != 0xF0) return false;
@@ -76,8 +74,7 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
         if (header_at(file, end, &next) && same_stream(next, *first)) {
             offset = end;
         } else {
-            // The stream is damaged. If the stated length is wrong, the next header may be inside
-            // this frame.
+            // Damage. If the stated length is wrong, the next header may be inside this frame.
             offset = find_frame(file, offset + h.head, first, &next);
             frame_entry &last = frames->entry[frames->count - 1];
             if (offset >= 0 && offset < end) {

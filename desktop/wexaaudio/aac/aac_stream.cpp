@@ -15,8 +15,7 @@ constexpr int32_t kPlainBytes = 2;             // of a configuration without mor
 constexpr int32_t kRateEscape = 15;            // the rate follows in 24 bits
 constexpr int32_t kObjectEscape = 31;          // 6 more bits follow
 
-// A stream with spectral band replication has an output rate of up to 48,000 Hz, twice its core
-// rate.
+// With spectral band replication the output has twice the core rate, at most 48,000 Hz.
 constexpr int32_t kMaxSbrCore = 24000;
 constexpr int32_t kSbrFrames = 8;  // frames decoded to find band replication; usually all have it
 constexpr int32_t kTriedFrames = 64;  // frames tried until one can be decoded
@@ -30,8 +29,7 @@ constexpr int32_t kMaxBlockBytes = 8191;    // limit of an ADTS header, beyond a
 //
 // For low complexity one frame covers the overlap. Band replication has filters and envelopes with
 // a longer memory, and its header may occur only in every tenth frame; with a preroll of 8 frames
-// the difference is audible. The prediction of other object types also remembers more than one
-// frame.
+// the difference is audible. Other object types use prediction, which has a longer memory, too.
 constexpr int32_t kGroup = 256;
 constexpr int32_t kPreroll = 1;
 constexpr int32_t kLongPreroll = 12;

@@ -1,5 +1,4 @@
-// libwexaaudio_av.so: the part of the codec library that calls libavcodec. See
-// shared/codec_library.h.
+// libwexaaudio_av.so, which calls libavcodec. See shared/codec_library.h.
 #include <pthread.h>
 
 #include <algorithm>
@@ -29,8 +28,7 @@ constexpr size_t kMaxBlock = size_t{128} << 20;  // most bytes that libavutil al
 
 pthread_once_t prepare_once = PTHREAD_ONCE_INIT;
 
-// Settings of the whole process: no messages on standard error, no huge allocations for damaged
-// counts.
+// For the whole process: no messages on standard error, no huge allocations for damaged counts.
 void prepare() {
     av_log_set_level(AV_LOG_QUIET);
     av_max_alloc(kMaxBlock);

@@ -17,8 +17,7 @@
 namespace {
 
 constexpr int32_t kPair = 2 * sizeof(int16_t);  // frames, or 0 if there are no groups
-constexpr int64_t kTail =
-    65'536;  // bytes at the end of the file, decoded first to find the last block
+constexpr int64_t kTail = 65'536;               // bytes decoded first to find the last block
 
 // Maximum plausible number of sample frames per byte of the file. Digital silence has 290 in the
 // encoder's default blocks of 4096, and 1200 in the largest blocks of a streamable file.

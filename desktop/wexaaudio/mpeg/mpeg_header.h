@@ -8,9 +8,8 @@
 #include "desktop/wexaaudio/shared/scan_cache.h"
 
 constexpr int32_t kMpegHeaderBytes = 4;
-constexpr int32_t kMpegMaxFrame = 1732;  // bytes: Layer II, 384 kbit/s at 32 kHz, padded
-constexpr int32_t kMpegMaxBackstep =
-    511;  // bytes that a Layer III frame's main data may start before the frame
+constexpr int32_t kMpegMaxFrame = 1732;    // bytes: Layer II, 384 kbit/s at 32 kHz, padded
+constexpr int32_t kMpegMaxBackstep = 511;  // bytes of main data before a Layer III frame
 
 struct mpeg_header {
     int32_t version;   // 1, 2, or 25 for 2.5

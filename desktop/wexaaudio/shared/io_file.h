@@ -7,9 +7,8 @@
 
 #include "media_source/mtsrc_io.h"
 
-constexpr int32_t kIoBlock = 65536;  // bytes read ahead
-constexpr int32_t kMaxLook =
-    kIoBlock / 2;  // largest number of bytes that io_file_peek can guarantee
+constexpr int32_t kIoBlock = 65536;         // bytes read ahead
+constexpr int32_t kMaxLook = kIoBlock / 2;  // bytes that io_file_peek can guarantee
 
 struct io_file {
     mtsrc_io io;        // a copy, so that the callbacks can be called while the reader is deleted

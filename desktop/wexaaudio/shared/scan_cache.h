@@ -1,5 +1,4 @@
-// Results of scanning files, shared by the readers of a file, because a job opens each file five
-// times.
+// Results of scanning files, shared by the readers of a file: a job opens it five times.
 //
 // A file is identified by its path's device, inode, size and time of change, so a file that was
 // replaced or written to is scanned again. The result used last stays for the next reader, unless

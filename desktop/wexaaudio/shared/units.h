@@ -5,9 +5,8 @@
 
 #include <cstdint>
 
-constexpr int64_t kUnits = 10'000'000;  // per second
-constexpr int64_t kMaxSamples =
-    INT64_MAX / kUnits / 4;  // far more than any file has; products cannot overflow
+constexpr int64_t kUnits = 10'000'000;                   // per second
+constexpr int64_t kMaxSamples = INT64_MAX / kUnits / 4;  // products of them cannot overflow
 
 // Start of a sample (>= 0, sample frames) in 100-ns units, rounded up.
 int64_t units_from_samples(int64_t sample, int32_t rate);
@@ -16,9 +15,8 @@ int64_t units_from_samples(int64_t sample, int32_t rate);
 // after that time, or end if the time is after the start of the last sample.
 int64_t seek_target(int64_t units, int64_t end, int32_t rate);
 
-// Duration of a stream, rounded up to a multiple of four units, so at most half a microsecond past
-// the last sample. Rounded this way, a quarter of the duration still contains a quarter of the
-// samples.
+// Duration of a stream, rounded up to a multiple of four units, so that a quarter of the duration
+// contains a quarter of the samples.
 int64_t units_of_duration(int64_t samples, int32_t rate);
 
 #endif

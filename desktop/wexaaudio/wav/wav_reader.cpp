@@ -1,5 +1,4 @@
-// RIFF WAVE with 16-bit linear PCM. Accepts chunks in any order, wrong sizes, and files larger than
-// 4 GiB.
+// RIFF WAVE with 16-bit linear PCM: chunks in any order, wrong sizes, files of more than 4 GiB.
 //
 // In: mtsrc_io. Out: complete sample frames of interleaved PCM, the information record.
 #include <algorithm>
