@@ -40,11 +40,14 @@ uint8_t *allocate_buffer(int64_t bytes) {
 
 const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end) {
     const uintptr_t page = page_size();
-    const uintptr_t first = (reinterpret_cast<uintptr_t>(begin) + page - 1) / page * page;
-    const uintptr_t last = reinterpret_cast<uintptr_t>(end) / page * page;
+    const auto bytes_into_page = [page](const uint8_t *p) {
+        return reinterpret_cast<uintptr_t>(p) % page;
+    };
+    const uint8_t *first = begin + (page - bytes_into_page(begin)) % page;
+    const uint8_t *last = end - bytes_into_page(end);
     if (first >= last) return begin;
-    madvise(reinterpret_cast<void *>(first), last - first, MADV_DONTNEED);
-    return reinterpret_cast<const uint8_t *>(last);
+    madvise(const_cast<uint8_t *>(first), static_cast<size_t>(last - first), MADV_DONTNEED);
+    return last;
 }
 
 bool is_incomplete() {
