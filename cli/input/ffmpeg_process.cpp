@@ -27,7 +27,7 @@ namespace {
 
 constexpr size_t kMostMessageBytes = 65536;  // only the first line is used
 // Limit of the address space. A damaged file can make ffmpeg allocate hours of silence at once.
-constexpr rlim_t kMostProgramBytes = rlim_t{768} << 20;
+constexpr rlim_t kMostProgramBytes = rlim_t{448} << 20;
 constexpr int kReadPollMs = 1000;  // between two checks of the clock
 constexpr int kEndPollMs = 10;     // between two checks whether the program has ended
 
@@ -53,10 +53,11 @@ std::string input_name(const ffmpeg_task &task) {
 }
 
 std::vector<std::string> command_line(const ffmpeg_task &task) {
-    std::vector<std::string> words = {
-        task.program, "-nostdin",          "-hide_banner", "-v",  "error", "-protocol_whitelist",
-        "file",       "-format_whitelist", kContainers,    "-vn", "-sn",   "-dn",
-        "-i",         input_name(task)};
+    // One thread: by default there is one per core, and each reserves 72 MiB of address space.
+    std::vector<std::string> words = {task.program, "-nostdin", "-hide_banner", "-v", "error"};
+    words.insert(words.end(), {"-threads", "1", "-filter_threads", "1"});
+    words.insert(words.end(), {"-protocol_whitelist", "file", "-format_whitelist", kContainers});
+    words.insert(words.end(), {"-vn", "-sn", "-dn", "-i", input_name(task)});
     words.insert(words.end(), task.arguments.begin(), task.arguments.end());
     return words;
 }
