@@ -1,4 +1,4 @@
-// Stage 6, inside: adds weaker peaks to long gaps between beats. Called by beat/candidates.h.
+// Part of stage 6: adds weaker peaks to long gaps between beats. Called by beat/candidates.h.
 #ifndef TAVO_BEAT_GAP_FILL_H
 #define TAVO_BEAT_GAP_FILL_H
 

@@ -174,8 +174,7 @@ void compute_flux(group_worker *record, int64_t k, int64_t end) {
 }
 
 // Computes a worker's analysis frames, two at a time; the last of an odd number is paired with
-// itself.
-// If memory runs out, the rows of a caller's own record are left unchanged.
+// itself. If memory runs out, the rows of a record that is not part of a group stay unchanged.
 void run_onset_worker(void *argument) {
     auto *worker = static_cast<TAVO_ONSET_WORKER *>(argument);
     group_worker *record = group_record(worker);

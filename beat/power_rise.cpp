@@ -38,8 +38,8 @@ double level_db(int32_t level) {
     return 20.0 * log10((level < kLevelFloor ? kLevelFloor : level) / kFullScale);
 }
 
-// Computes the sum of the ten squares around each of count (even) samples from first on, added in
-// their order. Calls use for each pair of sums.
+// Sums the ten squares around each of count (even) samples, starting at first. The order of the
+// additions is fixed. Calls use with each pair of sums.
 template <typename Use>
 void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
     double squares[kChunk + 2 * kSumRadius] = {};
@@ -144,8 +144,8 @@ double mean_ahead(const double *db) {
     return sum * 0.125;
 }
 
-// True if a rise starts in the block at db. Never true for an unmeasured block: the 60th percentile
-// would have to be kUnmeasured too, and no block is quieter.
+// True if a rise starts in the block at db. Never true for an unmeasured block: p60 would have to
+// be kUnmeasured too, and then the blocks before it could not be quieter.
 bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     const double step = mean - kMeanStep;
     const double quiet = step < limits->mid ? step : limits->mid;

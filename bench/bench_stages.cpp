@@ -1,4 +1,4 @@
-// Time of a job by stage, for a 3-minute stereo song of 120 BPM. The lines whose names start with
+// Time of a job by stage, for a 3-minute stereo song at 120 BPM. The lines whose names start with
 // "mode 1" add up to a whole mode-1 job of a 44.1 kHz file.
 #include <benchmark/benchmark.h>
 

@@ -1,4 +1,4 @@
-// The command line, parsed once. In: argc, argv. Out: options. Before: inputs.h, analyse_inputs.h.
+// The command line, parsed once. In: argc, argv. Out: options. Used by inputs.h, analyse_inputs.h.
 #ifndef TAVO_CLI_OPTIONS_H
 #define TAVO_CLI_OPTIONS_H
 

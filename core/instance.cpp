@@ -58,7 +58,7 @@ TAVO_CTX *open_instance(const TAVO_PARAM *param, int32_t *err) {
     TAVO_CTX *ctx = new_instance(param->mode);
     if (ctx == nullptr) return nullptr;
     if (tavo_decode_init(ctx, param) != 0) {
-        *err = TAVO_ERR_HANDLE;  // one code for every reason; tavo_probe returns the reason
+        *err = TAVO_ERR_HANDLE;  // whatever the reason, which tavo_probe returns
         clearTavoCtx(ctx);
         return nullptr;
     }

@@ -16,8 +16,8 @@ extern pthread_mutex_t tavo_mutex;
 extern pthread_cond_t tavo_cond;
 
 // Sets the stop flag and waits until the job has ended; its callback may still be running. The
-// caller must not hold tavo_mutex. Returns TAVO_OK, immediately if no job was started;
-// TAVO_ERR_HANDLE.
+// caller must not hold tavo_mutex. Returns TAVO_OK, at once if no job was started; TAVO_ERR_HANDLE
+// if ctx is not an instance.
 int32_t _tavo_quit(TAVO_CTX *ctx);
 
 // Thread entry of the watcher that _tavo_quit starts. It polls the state and then signals

@@ -161,9 +161,9 @@ inline double_pair windowed(const frame_pair &frames, size_t i) {
 
 constexpr size_t kFirstGroup = 8;  // elements that the first three stages combine
 
-// Runs the first three stages on the group of elements at first: the windowed samples from i on in
-// steps of step. Products with the factor 1 and with imaginary parts of zero are left out, which
-// changes only the sign of zeros if the results are finite.
+// Runs the first three stages on the eight windowed samples i, i + step, ..., i + 7 * step and
+// stores the results from x[first] on. Multiplications by 1 and by zero imaginary parts are
+// skipped; if the results are finite, this changes only the sign of zeros.
 inline void start_group(const frame_pair &frames, size_t i, size_t step, size_t first,
                         const spectrum<double_pair> &x, const TAVO_FFT_CTX *ctx) {
     const double_pair zero = {0.0, 0.0};
@@ -208,8 +208,8 @@ inline double_pair power_of(const complex<double_pair> &x) {
     return __builtin_convertvector(__builtin_convertvector(power, float_pair), double_pair);
 }
 
-// Runs the last two stages for the powers of the bins below size / 2 alone. Returns the sum of all
-// powers.
+// Runs the last two stages, computing only the powers of the bins below size / 2. Returns the sum
+// of these powers.
 double_pair finish_powers(const spectrum<double_pair> &x, size_t size, const TAVO_FFT_CTX *ctx,
                           double_pair *powers) {
     const size_t half = size / 4;

@@ -38,7 +38,7 @@ double *tavo_fft_proc(double *re, double *im, int16_t n, const TAVO_FFT_CTX *ctx
 // Releases the tables; a second call does nothing.
 void tavo_fft_deinit(TAVO_FFT_CTX *ctx);
 
-// Returns x with its lowest bits bits reversed; 0 if bits is not 1 to 31.
+// Returns the lowest `bits` bits of x in reverse order; 0 unless `bits` is 1 to 31.
 uint32_t bit_reverse2(uint32_t bits, uint32_t x);
 }
 

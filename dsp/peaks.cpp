@@ -8,7 +8,7 @@
 
 namespace {
 
-// Marks on the input's positions.
+// Flags stored for each input position.
 constexpr uint8_t kSuppressed = 1;
 constexpr uint8_t kPriority = 2;
 

@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """beats_against_reference.py SONG REFERENCE [PICTURE]
 
-Compares the beats that tavo finds with a reference: a text file with one time in seconds a line, as
+Compares the beats that tavo finds with a reference: a text file with one time in seconds per line, as
 annotators write it. Prints precision, recall and F-measure at 70 ms, computed by mir_eval (Debian:
 python3-mir-eval). With PICTURE, and matplotlib installed, both lists are drawn.
 """

@@ -47,7 +47,7 @@ uint32_t point_ms(int64_t k) {
     return static_cast<uint32_t>(static_cast<int64_t>(static_cast<float>(k + k) * 1000.0f));
 }
 
-// Ascending with NaNs last, a strict order for any values.
+// Ascending with NaNs last: a strict weak ordering of any values.
 bool is_less(float a, float b) {
     if (std::isnan(a) || std::isnan(b)) return !std::isnan(a);
     return a < b;

@@ -1,4 +1,4 @@
-// Stage 7b, inside: finds the quiet stretches of the loudness curve. Called by highlight/search.h.
+// Part of stage 7b: finds the quiet stretches of the loudness curve. Called by highlight/search.h.
 #ifndef TAVO_HIGHLIGHT_VALLEYS_H
 #define TAVO_HIGHLIGHT_VALLEYS_H
 

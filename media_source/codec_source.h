@@ -40,8 +40,8 @@ struct codec_ops {
 struct codec_source {
     const container_ops *container;
     const codec_ops *codec;  // null if no decoder supports the codec
-    // Reduces the decoded bytes at q_wr to one channel, in place. first: the reader's first value
-    // for the compressed frame. Returns the remaining bytes.
+    // Reduces the decoded bytes at q_wr to one channel, in place. first: the value that get_frm
+    // stored in *first for this compressed frame. Returns the number of bytes left.
     int32_t (*reduce)(const mtsrc_ctx *src, int32_t bytes, int64_t first);
 };
 
@@ -62,8 +62,8 @@ int32_t codec_source_begin_open(mtsrc_ctx *src, int32_t (*init)());
 int32_t codec_source_set_decoder(mtsrc_ctx *src, const codec_ops &codec, void *decoder,
                                  const mtsrc_format &format);
 
-// Ends every open that began. Frees the buffers of the tag record (may be null) and, if code is a
-// failure, everything that was created. Returns code.
+// Finishes an open, whether it succeeded or failed. Frees the buffers of the tag record (may be
+// null) and, if code is a failure, everything that was created. Returns code.
 int32_t codec_source_end_open(const codec_source &source, mtsrc_ctx *src, wexa_tags *tags,
                               int32_t code);
 

@@ -39,8 +39,8 @@ constexpr int32_t kMtsrcTypeUnknown = 2199;    ///< none of the above
 extern "C" {
 
 /// Opens a file through the caller's callbacks, which are copied. On success the handle owns
-/// io->path and releases it with free; on failure the caller still owns it. Returns as mtsrc_init.
-/// flags: not used, 0.
+/// io->path and releases it with free; on failure the caller still owns it. Reports errors as
+/// mtsrc_init does. flags: unused, pass 0.
 mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t flags, int32_t *err);
 
 /// Returns 0; -4 bad handle or null fmt.

@@ -10,11 +10,11 @@
 #include "media_source/mtsrc.h"
 
 constexpr int32_t kQueueBytes = 1'048'576;  // q_cap
-// Allocated after the queue's q_cap bytes. The largest FLAC block decodes to 262,140 bytes, half of
-// which remain in one channel; q_room exceeds 131,070 before each frame.
+// Extra bytes allocated after q_cap. The largest FLAC block decodes to 262,140 bytes of stereo, but
+// before each frame only 131,070 free bytes, its size in mono, are certain.
 constexpr int32_t kQueueSpareBytes = 131'070;
 
-// Codec codes of the codec library. Every frame record passes one to its decoder.
+// Codec codes of the codec library. Each compressed frame is passed to its decoder with one.
 constexpr int32_t kCodecMpeg = 305;
 constexpr int32_t kCodecAac = 306;
 constexpr int32_t kCodecFlac = 322;

@@ -87,7 +87,7 @@ bool refill(scan *s) {
     return s->got > 0;
 }
 
-// Refills the buffer with the bytes after the tag at index at.
+// Skips the tag that starts at buf[at] and refills the buffer with the bytes after it.
 bool skip_tag(scan *s, int32_t at) {
     int64_t start = 0;
     if (s->io->tell(s->file, &start) != 0) return false;
@@ -104,7 +104,7 @@ bool skip_tag(scan *s, int32_t at) {
     return s->io->skip(s->file, &length) == 0 && refill(s);
 }
 
-// Tests the candidate header at index at. Returns a type code that ends the scan, or 0 to continue.
+// Tests the candidate header at buf[at]. Returns a type code that ends the scan, or 0 to continue.
 int32_t try_candidate(const scan &s, int32_t at) {
     frame_header header;
     if (!parse(s.buf + at, &header)) return 0;

@@ -1,4 +1,4 @@
-// Four output frames of the windowed-sinc interpolator side by side, bit-identical to one by one.
+// Windowed-sinc interpolation of four output frames at once, bit-identical to one frame at a time.
 //
 // In: 16-bit mono PCM. Out: 16-bit mono PCM. Called by pcm/resample_sinc.cpp.
 #ifndef TAVO_PCM_SINC_QUAD_H

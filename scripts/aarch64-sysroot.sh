@@ -28,7 +28,7 @@ Dir::Cache::archives "$apt/archives";
 END
 export APT_CONFIG="$apt/apt.conf"
 apt-get -qq update
-# shellcheck disable=SC2086 # the packages are words
+# shellcheck disable=SC2086 # word splitting is intended
 apt-get -qq -y --download-only install $packages >/dev/null
 # shellcheck disable=SC2086
 (cd "$apt/archives" && apt-get -qq download $headers)

@@ -15,7 +15,7 @@ done
 if [ -n "$missing" ]; then
   [ "$(id -u)" = 0 ] || { echo "test-aarch64.sh: install first:$missing" >&2; exit 1; }
   apt-get -qq update
-  # shellcheck disable=SC2086 # the packages are words
+  # shellcheck disable=SC2086 # word splitting is intended
   DEBIAN_FRONTEND=noninteractive apt-get -qq -y install $missing >/dev/null
 fi
 scripts/aarch64-sysroot.sh

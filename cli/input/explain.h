@@ -1,5 +1,5 @@
-// Explains why a file cannot be analysed. tavo_init has one code for every reason, so the reason
-// comes from the system or from tavo_probe.
+// Explains why a file cannot be analysed. tavo_init returns the same code for every such file, so
+// the reason comes from the system or from tavo_probe.
 #ifndef TAVO_CLI_INPUT_EXPLAIN_H
 #define TAVO_CLI_INPUT_EXPLAIN_H
 

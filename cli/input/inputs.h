@@ -1,6 +1,6 @@
 // Finds the files to analyse, one at a time, in the order of the command line.
 //
-// In: options (files, folders, lists). Out: one input per file. Before: analyse_inputs.h.
+// In: options (files, folders, lists). Out: one input per file. Used by analyse_inputs.h.
 #ifndef TAVO_CLI_INPUT_INPUTS_H
 #define TAVO_CLI_INPUT_INPUTS_H
 

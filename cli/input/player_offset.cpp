@@ -14,8 +14,8 @@ constexpr int64_t kDecoderDelay = 529;  // samples, of every Layer III decoder
 constexpr int32_t kDropRate = 44'100;   // Hz; at this rate the library drops that delay in stereo
 constexpr int64_t kLayer1Samples = 384;
 
-// Samples that players drop according to the LAME header in the first frame, which starts at frame;
-// 0 without such a header.
+// Returns the samples that players drop according to the LAME header; 0 without such a header.
+// frame: bytes of the file from the first compressed frame on.
 int64_t samples_dropped(std::string_view frame) {
     const auto byte = [&](size_t i) { return static_cast<uint8_t>(frame[i]); };
     const bool is_mpeg1 = (byte(1) >> 3 & 3) == 3;

@@ -2,8 +2,8 @@
 const body = document.querySelector("#songs tbody");
 const heads = [...document.querySelectorAll("#songs thead th")];
 
-// A cell's data-value is a number. A cell without one is sorted by its text. Songs without a value
-// come last.
+// Sorts the first column by text and the others by data-value. Songs without a data-value come
+// last.
 function compare(column, sign) {
   return (a, b) => {
     const [x, y] = [a.cells[column], b.cells[column]];

@@ -1,5 +1,5 @@
-// Writes replies in the order of the inputs, although they arrive in any order: results to standard
-// output, messages to standard error. Clears the progress line first.
+// Writes replies in the order of the inputs, whatever order they arrive in: results to
+// standard output, messages to standard error. Clears the progress line first.
 #ifndef TAVO_CLI_RUN_ORDERED_OUTPUT_H
 #define TAVO_CLI_RUN_ORDERED_OUTPUT_H
 

@@ -12,7 +12,7 @@ constexpr Oid kBytesOid = 17;  // of the server's types, fixed for all versions
 constexpr Oid kBigintOid = 20;
 constexpr Oid kIntegerOid = 23;
 
-// Returns the server's text in one line.
+// Returns the server's text on one line.
 std::string sentence(const char *words) {
     std::string text = words;
     while (!text.empty() && text.back() == '\n') text.pop_back();

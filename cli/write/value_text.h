@@ -15,7 +15,8 @@ const char *mode_word(int32_t mode);
 int32_t mode_of(const std::string &word);  // TAVO_MODE_*; the inverse of mode_word
 const char *status_word(outcome status);
 
-// Formats a time as m:ss.t, or as h:mm:ss.t from an hour on. whole_clock_text omits the tenths.
+// Formats a time as m:ss.t, or as h:mm:ss.t if it is an hour or longer. whole_clock_text omits the
+// tenths.
 std::string clock_text(double ms);
 std::string whole_clock_text(double ms);
 

@@ -14,7 +14,7 @@ struct copy_decoder {
     int32_t rate;  // Hz, as configured; AAC only
 };
 
-// channels: the output of the codec's readers, the only configuration that is supported.
+// channels: number of channels that the codec's readers deliver; any other is refused.
 copy_decoder *create(const wexa_config *config, int32_t channels) {
     if (config->bytes_per_sample != kSampleBytes || config->output_channels != channels) {
         return nullptr;

@@ -39,22 +39,21 @@ TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
         {{{12, 1}}, 90},            // 215 BPM is discarded
         {{{18, 1}, {26, 1}}, 143},  // 0.967 and 0.964, on either side of 120 BPM
         {{{18, 1}, {26, 1.01}}, 99},
-        // 20 and its double have 0.994 + 0.5 x 0.671 = 1.330, or with the double's neighbours 0.25
-        // x 1.342. 27 has 1.313 or 1.346, 1.300 or 1.360.
+        // Lag 20 scores 0.994, and its double adds 0.5 x 0.671: 1.330. The double's neighbours add
+        // 0.25 x 1.342 instead. Lag 27 scores 1.313 or 1.346, and then 1.300 or 1.360.
         {{{20, 1}, {40, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {40, 1}, {27, 1.42}}, 95},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.371}}, 129},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.434}}, 95},
-        // With its triple and the triple's neighbours 20 has 0.33 x 1.006 more. 27 has 1.313 or
-        // 1.340.
+        // The triple of 20 and the triple's neighbours raise its score to 1.326. Lag 27 scores
+        // 1.313 or 1.340.
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.413}}, 95},
         {{{20, 1}, {59, 1}, {27, 1.1}}, 129},  // only 59: 1.109 and 1.043
-        // The part of 20 in the sum of 20 and its double is 0.533 or 0.527. The double has 64 BPM.
+        // Lag 20 contributes 0.533 or 0.527 of its score, its double (64 BPM) the rest.
         {{{20, 1}, {40, 1.30}}, 129},
         {{{20, 1}, {40, 1.33}}, 64},
-        // The longest lags: 42 against 27 with 0.45, and 81 as the triple of 27, whose part is
-        // 0.51.
+        // The longest lags: 42 beats 27, which scores 0.45; then 81 as the triple of 27.
         {{{42, 1}, {27, 0.475}}, 61},
         {{{27, 1}, {81, 5.6}}, 31},
     };

@@ -1,4 +1,4 @@
-"""Tests marker files with other programs, or with the published rules of the editors."""
+"""Tests marker files with other programs or against the published rules of the editors."""
 import csv
 import json
 import os

@@ -85,7 +85,7 @@ class Workers(Case):
                 self.assertTrue(select.select([end], [], [], 60)[0], "the worker goes on")
 
     def test_a_stop_keeps_what_is_finished(self):
-        # kill signals the process, a terminal the group. Finished results wait for the stopped file.
+        # kill signals one process, a terminal the group. Results that wait for long.wav are kept.
         for send, number, words, busy, finished in (
                 (os.kill, signal.SIGTERM, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
                 (os.killpg, signal.SIGINT, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),

@@ -186,7 +186,7 @@ TEST(Aac, RateAndChannelsComeFromTheFrames) {
     }
 }
 
-// Reads of large blocks return little at once. Recognition requests less and needs all of it.
+// Reads of more than 40,000 bytes return only 100. Recognition uses smaller reads, which are full.
 TEST(Reader, AcceptsShortReads) {
     for (const char *name :
          {"song.wav", "cbr.mp3", "song.flac", "low.aac", "last.m4a", "song.ogg"}) {

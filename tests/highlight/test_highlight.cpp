@@ -176,8 +176,8 @@ TEST(Search, ReturnsTheBestEdge) {
         {"3 0.1 1 1 11 0.1 6 0.45 7 0.1 1 0.35 12 0.65 19 0.1", 120, 56000},
         // Edge at 13: 0.5625 + 0.4375. Edge at 30: 0.5 + 0.5. Equal, so the larger step wins.
         {"3 0.125 1 1 9 0.125 1 0.375 7 0.8125 10 0.25 10 0.75 19 0.25", 120, 60000},
-        // A step of 0.3 within the passage, from 0.8 to 0.75 on average, is not scored, so the
-        // answer is the point after the only edge. From 0.75 to 0.75 it is scored.
+        // The step from 0.6 to 0.9 is not scored, because the average falls from 0.8 to 0.75. The
+        // answer is the point after the only edge. With equal averages of 0.75 the step is scored.
         {"5 0.25 10 1 1 0.6 1 0.9 20 0.6 23 0.25", 120, 32000},
         {"5 0.25 10 1 1 0.5 1 0.875 20 0.625 23 0.25", 120, 30000},
         // Four loud points after an edge are a passage, three are not, even if values at the mean
@@ -371,10 +371,9 @@ TEST(Position, ReturnsTheTunedStart) {
     clearHighlgihtCtx(nullptr);
 }
 
-// The only edge leads to the window at 112 s, the second-to-last of 120 s. Its tuning needs audio
-// up to 120.6 s, which the duration states but the PCM does not have. With that audio the same
-// start is tuned: of the windows from 109 s on, the largest rise is at 14, and the level step after
-// it is from 18 to 19: 109 s + 7.2 s.
+// The coarse start is 112 s, and tuning it needs audio up to 120.6 s. The first PCM ends at 120 s,
+// so the start is left as it is, although the stated duration is longer. The second PCM has enough
+// audio, and the start moves to 116.2 s.
 TEST(Position, TuningDoesNotReadPastThePcm) {
     EXPECT_EQ(find_position(make_pcm("116 .04 2 .64 2 .04", kRate), 200, 58), 112000u);
     EXPECT_EQ(find_position(make_pcm("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);

@@ -163,7 +163,7 @@ TEST_F(OpenClose, UnusablePathsAreRefused) {
     EXPECT_EQ(open_path(longest), 0);
     EXPECT_EQ(open_path("/" + longest), -3);
 
-    // A caller's own callback record with a descriptor is read from its start.
+    // A descriptor in the caller's own callbacks is read from the start of the file.
     const int fd = open(path.c_str(), O_RDONLY);
     ASSERT_EQ(lseek(fd, 7, SEEK_SET), 7);
     mtsrc_io io = {};

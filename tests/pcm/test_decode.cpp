@@ -111,7 +111,7 @@ class Decode : public song_plan {
     std::string stream = noise(160'000, 1);
 };
 
-// The last segment starts at byte 120,000 and needs more than the second that it drops.
+// The stream must extend past byte 136,000: the last segment starts at 120,000 and drops a second.
 TEST_F(Decode, OutputEqualsTheStream) {
     for (const int64_t end : {160'000, 159'999, 136'200, 136'000, 120'000, 100'000}) {
         const int64_t want = end > 136'000 ? end : 0;

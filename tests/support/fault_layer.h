@@ -34,7 +34,7 @@ struct plan {
     void (*on_call)() = nullptr;  // called before each counted call
 };
 
-// Starts counting and failing by this plan. No other thread of the library may be running.
+// Starts counting calls and making them fail as planned. No other library thread may be running.
 void arm(const plan &next);
 inline void disarm() {
     arm({});

@@ -23,7 +23,7 @@ constexpr int32_t kTriedFrames = 64;  // frames tried until one can be decoded
 constexpr int32_t kMaxFrameSamples = 4096;  // as 16-bit pairs, well within a source's frame buffer
 constexpr int32_t kMaxBlockBytes = 8191;    // limit of an ADTS header, beyond any real block
 
-// A decoder's noise generator has a state, so each group of frames has a fresh decoder. Opening a
+// A decoder's noise generator is stateful, so each group of frames has a fresh decoder. Opening a
 // decoder costs as much as decoding several frames, which favours large groups. A seek decodes half
 // a group on average, which favours small ones.
 //

@@ -5,7 +5,7 @@
 
 namespace {
 
-// Four samples in one register, by the compiler's vector extension.
+// Four samples in one register, using the compiler's vector extension.
 typedef float float_quad __attribute__((vector_size(16)));
 typedef int32_t int_quad __attribute__((vector_size(16)));
 typedef uint32_t bits_quad __attribute__((vector_size(16)));

@@ -22,7 +22,7 @@ struct stream_reader {
 // memory runs out. *duration receives the duration of the stream in 100-ns units.
 stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration);
 
-// Copies bytes. The offset is of the same kind as the offsets of the frames. Returns the bytes
+// Copies bytes from an offset as in frame_entry, which is a logical one for Ogg. Returns the bytes
 // copied, fewer if the pages or the file end first; -1 on a read error.
 int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
                     int64_t bytes);

@@ -168,7 +168,7 @@ public final class Analyze {
         return text.toString();
     }
 
-    /** Formats a time as m:ss.t, or as h:mm:ss.t from an hour on. */
+    /** Formats a time as m:ss.t, or as h:mm:ss.t if it is an hour or longer. */
     private static String clock(double ms) {
         long tenths = Math.round(ms / 100.0);
         long whole = tenths / 10;
