@@ -1,6 +1,6 @@
-// Stage 4, set-up: the context of one beat analysis, and the lock of its worker groups.
+// Sets up stage 4: the context of one beat analysis, and the lock of its worker groups.
 //
-// In: TAVO_CTX with ana, ana_len, ana_rate and onset. The context lives for one call of
+// Input: TAVO_CTX with ana, ana_len, ana_rate and onset. The context lives for one call of
 // getBeatPosition.
 #ifndef TAVO_BEAT_BEAT_CTX_H
 #define TAVO_BEAT_BEAT_CTX_H
@@ -56,15 +56,15 @@ void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
 // Releases what the context owns, the lock and the condition, but not the record itself.
 void __tavo_deinit(TAVO_BEAT_CTX *beat);
 
-// Fills matrix[bin][band] with the weights of nbands triangles for the bins 0 .. nfft / 2 - 1. The
-// triangles have unit area and are equally spaced on the mel scale from 0 to fmax Hz.
+// Fills matrix[bin][band] with the weights of `nbands` triangles for bins 0 .. nfft / 2 - 1. The
+// triangles have unit area and are equally spaced on the mel scale from 0 to `fmax` Hz.
 void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float **matrix);
 }
 
-// Divides the first count samples of view by its full scale.
+// Divides the first `count` samples of `view` by its full scale.
 void scale_samples(sample_view view, int64_t count, double *scaled);
 
-// The body of __beat_init. Jobs read ana directly and set with_signal to false: signal and
+// The body of __beat_init. Jobs read `ana` directly and set with_signal to false: `signal` and
 // rise_flags, 12 bytes per sample, then stay null. Returns false if memory runs out for any other
 // field.
 bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat);

@@ -1,7 +1,7 @@
 // Stages 4 to 6: the beats and the tempo of the analysis signal.
 //
-// In: TAVO_CTX with ana, ana_len, ana_rate. Out: TAVO_ONSET_CTX bpm, beat_count, beat_times (ms
-// from the start of the signal). Before: pcm/resample.h. After: the callback.
+// Input: TAVO_CTX with ana, ana_len, ana_rate. Output: TAVO_ONSET_CTX bpm, beat_count, beat_times
+// (ms from the start of the signal). Follows pcm/resample.h; precedes the callback.
 #ifndef TAVO_BEAT_BEATS_H
 #define TAVO_BEAT_BEATS_H
 
@@ -9,8 +9,8 @@
 
 extern "C" {
 
-// Returns the number of beats and sets the state to finished. A stop request is checked before the
-// onset envelope and after the tempo; it returns 0 and leaves the state unchanged.
+// Returns the number of beats and sets the state to finished. If a check before the onset
+// envelope or after the tempo finds a stop request, returns 0 and leaves the state unchanged.
 int32_t getBeatPosition(TAVO_CTX *ctx);
 
 // Releases the beats and the record itself. Null is ignored.

@@ -18,7 +18,7 @@ constexpr float kMsPerSecond = 1000.0f;
 
 // Distances between beats at one tempo.
 struct spacing {
-    float span;  // seconds: a whole number of beat periods, the smallest distance of two beats
+    float span;        // seconds: a whole number of beat periods, the smallest beat distance
     int32_t distance;  // span in analysis frames
     int32_t window;    // analysis frames in the threshold's window, even
 };
@@ -50,7 +50,7 @@ int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const do
     return accepted;
 }
 
-// Writes the beat times to out. thr: [F - 1] zeroed; peaks: zeroed. Returns their number.
+// Writes the beat times to out. thr: [F - 1] zeroed; peaks: zeroed. Returns the number of beats.
 int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *thr,
                       PEAK_LIST *peaks, float *out) {
     const int64_t count = beat->frame_count > 1 ? beat->frame_count - 1 : 0;
@@ -75,7 +75,7 @@ int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *
     return total;
 }
 
-// The capacity for peaks: no two of them are neighbours.
+// Capacity of the peak list: half the frames, as no two peaks are neighbours, plus the rises.
 int64_t peak_capacity(const TAVO_BEAT_CTX *beat) {
     return (beat->frame_count > 0 ? beat->frame_count / 2 : 0) + beat->rise_count;
 }

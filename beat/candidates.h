@@ -1,5 +1,5 @@
-// Stage 6: selects beats among the peaks of the onset envelope. Before: beat/tempo.h,
-// beat/power_rise.h, beat/threshold.h. After: beat/beats.h.
+// Stage 6: selects beats among the peaks of the onset envelope. Follows beat/tempo.h,
+// beat/power_rise.h and beat/threshold.h; precedes beat/beats.h.
 #ifndef TAVO_BEAT_CANDIDATES_H
 #define TAVO_BEAT_CANDIDATES_H
 
@@ -7,8 +7,8 @@
 
 extern "C" {
 
-// Writes the beat times (ms, ascending) to out, which has candidate_capacity entries. Returns their
-// number; 0 if memory runs out.
+// Writes the beat times (ms, ascending) to `out`, which has candidate_capacity entries. Returns the
+// number of beats, or 0 if memory runs out.
 int32_t getBeatCandi_MT(TAVO_BEAT_CTX *beat, TAVO_ONSET_CTX *onset, float *out);
 }
 

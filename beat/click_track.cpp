@@ -118,7 +118,7 @@ void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, flo
 }
 
 // Allocates memory before it creates the file, so that no unfinished file is left. Makes the blips
-// afterwards, so that a host without the file does not pay for them.
+// afterwards, so that no time is spent on them if the file cannot be created.
 void write_click_track(const TAVO_CTX *ctx) {
     if (fnamedec == nullptr || fnamedec[0] == '\0') return;
     const int64_t n = analysis_length(ctx);

@@ -1,5 +1,5 @@
 // Diagnostic: writes the analysed signal with a blip at every beat as a mono 16-bit WAV file. The
-// public global fnamedec (include/tavo.h) is its path. Before: beat/beats.h.
+// public global fnamedec (include/tavo.h) is its path. Follows beat/beats.h.
 #ifndef TAVO_BEAT_CLICK_TRACK_H
 #define TAVO_BEAT_CLICK_TRACK_H
 
@@ -10,7 +10,7 @@
 
 extern "C" {
 
-// Writes the 44-byte header of a file of n samples. Returns the number of headers written, 1 or 0.
+// Writes the 44-byte header of a file of `n` samples. Returns the headers written, 1 or 0.
 int32_t makeWaveHeader(uint32_t n, FILE *stream);
 
 // Adds a 100 ms blip to the zeroed track[n] at each of beats[count] (ms).

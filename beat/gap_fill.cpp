@@ -33,8 +33,8 @@ value_rank next_largest(const int32_t *candidates, int32_t count, const double *
     return best;
 }
 
-// Writes the maxn strongest candidates, strongest first. Of equal ones it writes the first, as many
-// times as there are.
+// Writes the maxn strongest candidates, strongest first. If several are equal, the first of them is
+// written once for each.
 int32_t write_strongest(const int32_t *candidates, int32_t count, int32_t maxn, const double *env,
                         int32_t *dst) {
     int32_t written = 0;

@@ -20,7 +20,7 @@ typedef double mel_row[kMelBands];
 struct group_worker {
     TAVO_ONSET_WORKER worker;
     sample_view view;
-    double *flux;  // [F - 1] shared; a worker fills it from its first frame to before its last
+    double *flux;         // [F - 1] shared; a worker fills entries first to last - 1
     mel_row rows[kRows];  // row k % kRows: decibels of frame k
     mel_row first_row;    // decibels of the worker's first frame
     bool is_complete;
@@ -97,7 +97,7 @@ void release_scratch(worker_scratch *scratch) {
     free(scratch->band_end);
 }
 
-// Scales the samples of the frames k and next, except those that the two frames before have too.
+// Scales the samples of frames `k` and `next`, except those shared with the two previous frames.
 void scale_frames(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next, double *samples) {
     const group_worker *record = group_record(worker);
     sample_view view = record != nullptr ? record->view : sample_view{worker->signal, 1.0};
@@ -109,7 +109,7 @@ void scale_frames(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next, double *sa
     scale_samples(view, size + (next - k) * hop - kept, samples + kept);
 }
 
-// Computes the powers of the frames k and next and fills their spectrum rows if the record has any.
+// Computes the powers of frames `k` and `next` and fills their spectrum rows if the record has any.
 void compute_spectrum(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
                       const worker_scratch *scratch) {
     const int32_t size = worker->frame_size;
@@ -132,7 +132,7 @@ double *mel_row_of(TAVO_ONSET_WORKER *worker, int64_t k) {
     return record != nullptr ? record->rows[k % kRows] : worker->mel[k];
 }
 
-// Fills the mel rows of the frames k and next. As in MultiplyMtxs, terms with a zero factor are
+// Fills the mel rows of frames `k` and `next`. As in MultiplyMtxs, terms with a zero factor are
 // skipped.
 void compute_bands(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
                    const worker_scratch *scratch) {
@@ -161,7 +161,7 @@ double spectral_flux(const double *row, const double *next) {
     return sum / kMelBands;
 }
 
-// Fills the flux from each of the frames k - 1 to end - 2 to the next one.
+// Computes the flux from each of the frames k - 1 to end - 2 to the frame after it.
 void compute_flux(group_worker *record, int64_t k, int64_t end) {
     for (; k < end; ++k) {
         const double *row = record->rows[k % kRows];

@@ -1,7 +1,7 @@
 // Stage 4: the onset envelope, the mean change of the mel spectrum between analysis frames.
 //
-// In: the analysis signal. Out: TAVO_BEAT_CTX.onset_env, one value per hop (256 samples at 11025
-// Hz), divided by its standard deviation. Before: beat/beat_ctx.h. After: beat/tempo.h,
+// Input: the analysis signal. Output: TAVO_BEAT_CTX.onset_env, one value per hop (256 samples at
+// 11025 Hz), divided by its standard deviation. Follows beat/beat_ctx.h; precedes beat/tempo.h and
 // beat/threshold.h.
 #ifndef TAVO_BEAT_ONSET_ENVELOPE_H
 #define TAVO_BEAT_ONSET_ENVELOPE_H

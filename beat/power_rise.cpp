@@ -14,7 +14,7 @@ constexpr int32_t kTopLevel = 32767;    // levels are 16-bit values
 constexpr int32_t kLevelFloor = 1000;   // -30.31 dB
 constexpr int32_t kDecay = 1000;        // an earlier peak decays by a thousandth per sample
 constexpr int64_t kSumRadius =
-    5;  // a sample's sum has this many samples before it, and as many from it on
+    5;  // a sample's sum covers this many samples before it, and as many starting with it
 constexpr int64_t kChunk = 256;                         // sums computed at once; even
 static_assert(kBlock % 2 == 0 && kSumRadius % 2 == 1);  // every block has an even number of sums
 constexpr int64_t kLookAhead = 8;                       // blocks in the four-second mean
@@ -38,8 +38,8 @@ double level_db(int32_t level) {
     return 20.0 * log10((level < kLevelFloor ? kLevelFloor : level) / kFullScale);
 }
 
-// Sums the ten squares around each of count (even) samples, starting at first. The order of the
-// additions is fixed. Calls use with each pair of sums.
+// Sums the ten squares around each of `count` (even) samples, starting at `first`. The order of the
+// additions is fixed. Calls `use` with each pair of sums.
 template <typename Use>
 void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
     double squares[kChunk + 2 * kSumRadius] = {};
@@ -47,7 +47,7 @@ void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
         const int64_t part = std::min(kChunk, count - done);
         const int64_t used = part + 2 * kSumRadius - 1;
         scale_samples({view.samples + (first + done - kSumRadius), view.full_scale}, used, squares);
-        for (double &square : squares) square *= square;  // a fixed number: in vectors
+        for (double &square : squares) square *= square;  // a fixed count, so vectorised
         for (int64_t j = 0; j < part; j += 2) {
             const auto two = [p = squares + j](int64_t k) { return load_pair(p + k); };
             const double_pair sum = two(0) + two(1) + two(2) + two(3) + two(4) + two(5) + two(6) +
@@ -57,22 +57,22 @@ void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
     }
 }
 
-// The level that belongs to a sum of ten squares, clamped to 0..32767; NaN becomes 0.
+// Converts a sum of ten squares to a level, clamped to 0..32767; NaN becomes 0.
 int32_t level_of(double sum) {
     const double mean = sum / 10.0 * kFullScale;
     if (!(mean > 0.0)) return 0;
     return mean < kTopLevel ? static_cast<int32_t>(mean) : kTopLevel;
 }
 
-// The level of a sample: its own, or that of an earlier peak that has decayed less. *decayed is the
-// decayed level, updated for the next sample.
+// The level of a sample: its own or the decayed level of an earlier peak, whichever is larger.
+// *decayed is that decayed level, updated for the next sample.
 int32_t follow_level(double sum, int32_t *decayed) {
     const int32_t level = std::max(level_of(sum), *decayed);
     *decayed = level - level / kDecay;
     return level;
 }
 
-// Number of samples until a level has decayed to bottom, or below the floor, where it has no
+// Number of samples until a level has decayed to `bottom`, or below the floor, where it has no
 // effect.
 constexpr int64_t samples_to_decay(int32_t level, int32_t bottom) {
     int64_t count = 0;
@@ -82,7 +82,7 @@ constexpr int64_t samples_to_decay(int32_t level, int32_t bottom) {
 constexpr int64_t kLongestDecay = samples_to_decay(kTopLevel, 0);
 static_assert(kLongestDecay < kBlock - kSumRadius);
 
-// The decayed level at the end of block b, computed from the block's last count samples.
+// The decayed level at the end of block b, computed from the last `count` samples of the block.
 int32_t find_decayed_level(sample_view view, int64_t b, int64_t count) {
     int32_t decayed = 0;
     if (b < 1 || count < 1) return decayed;
@@ -94,8 +94,8 @@ int32_t find_decayed_level(sample_view view, int64_t b, int64_t count) {
     return decayed;
 }
 
-// The largest level of a sample in block b, without decayed peaks of the block before. NaN is
-// ignored.
+// The largest level of any sample in block b, not counting peaks that decay from the previous
+// block. NaN is ignored.
 int32_t largest_level(sample_view view, int64_t b) {
     const int64_t first = b == 1 ? kSumRadius : (b - 1) * kBlock + 1;
     double_pair most = {0.0, 0.0};
@@ -104,8 +104,8 @@ int32_t largest_level(sample_view view, int64_t b) {
     return level_of(std::max(most[0], most[1]));
 }
 
-// Fills blocks->db. A block's largest level belongs to its largest sum, or is what is left of a
-// peak in the block before, so only two levels per block are converted to decibels.
+// Fills blocks->db. A block's largest level comes from its largest sum or from a decaying peak of
+// the previous block, so only two levels per block are converted to decibels.
 void measure_blocks(block_levels *blocks, int64_t n) {
     std::fill_n(blocks->db, blocks->count + kLookAhead, kUnmeasured);
     int32_t largest_before = 0;
@@ -117,8 +117,8 @@ void measure_blocks(block_levels *blocks, int64_t n) {
     }
 }
 
-// Index of the first sample from (b - 1) * kBlock to b * kBlock whose level reaches target, or -1.
-// b is at least 2. The first and the last sample count with the largest level of their block.
+// Index of the first sample from (b - 1) * kBlock to b * kBlock whose level reaches `target`, or
+// -1. b is at least 2. The first and the last sample are given the largest level of their block.
 int64_t find_sample(const block_levels *blocks, int64_t b, double target) {
     const int64_t start = (b - 1) * kBlock;
     if (blocks->db[b - 1] >= target) return start;
@@ -144,8 +144,8 @@ double mean_ahead(const double *db) {
     return sum * 0.125;
 }
 
-// True if a rise starts in the block at db. Never true for an unmeasured block: p60 would have to
-// be kUnmeasured too, and then the blocks before it could not be quieter.
+// True if a rise starts in the block whose level is db[0]. Never true for an unmeasured block: p60
+// would have to be kUnmeasured too, and then the blocks before it could not be quieter.
 bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     const double step = mean - kMeanStep;
     const double quiet = step < limits->mid ? step : limits->mid;

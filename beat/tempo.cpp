@@ -12,16 +12,16 @@ constexpr double kSlowestBpm = 30.0;            // determines the largest lag
 constexpr double kPreferredBpm = 120.0;         // centre of the weighting
 constexpr double kOctave = 0.6931471805599453;  // ln 2: the width of the weighting
 constexpr double kFasterWins =
-    0.53;  // part of the shorter period in the sum of both above which it wins
+    0.53;  // the shorter period wins above this fraction of the sum of both
 constexpr int32_t kFastestBpm = 200;  // a faster estimate is replaced by kDefaultBpm
 constexpr int32_t kDefaultBpm = 90;
 
 struct period_candidate {
     double score;
-    int32_t lag;  // analysis frames; 0 without a candidate
+    int32_t lag;  // analysis frames; 0 if there is none
 };
 
-// Best score of a period and its double. Scores must exceed 0; of equal ones the first wins.
+// Finds the period that scores best with its double. Scores must exceed 0; on a tie the first wins.
 period_candidate best_of_two(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 2; ++k) {
@@ -31,7 +31,7 @@ period_candidate best_of_two(const double *r, int32_t lags) {
     return best;
 }
 
-// Best score of a period and its triple.
+// Finds the period that scores best with its triple.
 period_candidate best_of_three(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 3; ++k) {
@@ -41,7 +41,7 @@ period_candidate best_of_three(const double *r, int32_t lags) {
     return best;
 }
 
-// The beat period in analysis frames; 0 without a candidate.
+// The beat period in analysis frames; 0 if there is no candidate.
 int32_t choose_period(const double *r, int32_t lags) {
     const period_candidate two = lags < 4 ? period_candidate{0.0, 0} : best_of_two(r, lags);
     const period_candidate three = lags < 6 ? period_candidate{0.0, 0} : best_of_three(r, lags);
@@ -62,8 +62,8 @@ void weigh_lags(double *r, int32_t lags, double hop) {
     }
 }
 
-// Replaces the excerpt in re[nfft] by its circular autocorrelation, re[t] for t < lags. From nfft
-// on it repeats.
+// Replaces the excerpt in re[nfft] with its circular autocorrelation, re[t] for t < lags, which
+// repeats every nfft entries.
 int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32_t lags) {
     if (tavo_dft(re, im, nfft, count, 1) != 0) return TAVO_ERR_MEMORY;
     for (int64_t k = 0; k < nfft; ++k) re[k] = re[k] * re[k] + im[k] * im[k];
@@ -81,8 +81,8 @@ int64_t transform_size(int64_t count) {
     return size;
 }
 
-// The beat period of the excerpt x[count] in analysis frames; 0 without one; TAVO_ERR_MEMORY. A
-// single NaN, as in silence, would make every correlation NaN, so the transforms are skipped.
+// The beat period of x[count] in analysis frames, 0 if there is none, or TAVO_ERR_MEMORY. A single
+// NaN, as in silence, would make every correlation NaN, so the transforms are then skipped.
 int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, double hop) {
     for (int32_t i = 0; i < count; ++i) {
         if (!std::isfinite(x[i])) return 0;

@@ -11,7 +11,7 @@ int32_t percentile_index(int32_t count, int32_t percentile) {
     return static_cast<int32_t>(int64_t{count} * percentile / 100);
 }
 
-// Moves the value at pos to its sorted position among otherwise ascending values. NaNs (from silent
+// Moves sorted[pos] to its sorted position among otherwise ascending values. NaNs (from silent
 // input) are left in place.
 void move_up(double *sorted, int32_t pos, int32_t count) {
     const double value = sorted[pos];
@@ -37,8 +37,8 @@ double percentile_of(const double *env, int32_t count, double *scratch) {
 }
 
 // Slides the sorted window over the worker's range. At index i it holds the W values that start
-// half a window before i. Each step replaces the value that leaves the window by the one that
-// enters.
+// half a window before i. Each step replaces the value that leaves the window with the one
+// that enters.
 void slide_window(TAVO_THRES_WORKER *worker, double *win) {
     const int32_t size = worker->window;
     const int32_t half = size / 2;
@@ -77,7 +77,7 @@ void run_thres_worker(void *record) {
     free(win);
 }
 
-// Divides the indices whose window fits into four equal ranges; all are empty if no window fits.
+// Divides the indices that have a full window into four equal ranges, all empty if there are none.
 // Neighbouring ranges would share their boundary index; it belongs to the earlier worker, so that
 // no two threads write the same value.
 void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
@@ -121,7 +121,7 @@ int32_t run_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr, doub
     return 0;
 }
 
-// Fills the part after the last full window with a straight line towards top.
+// Fills the part after the last full window with a straight line towards `top`.
 void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
     const int64_t fitting = count - window / 2;
     const int64_t start = fitting > 1 ? fitting : 1;
@@ -131,8 +131,8 @@ void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
     }
 }
 
-// Fills the part before the first full window with the percentile of the second around each index;
-// the first half second stays 0. In a short signal the second is cut off at the end.
+// Fills the part before the first full window with the percentile of a second of values around each
+// index; the first half second stays 0. In a short signal the second is cut off at the end.
 void fill_head(const TAVO_BEAT_CTX *beat, int32_t window, int32_t second, double *thr,
                double *scratch) {
     const int64_t count = beat->frame_count - 1;

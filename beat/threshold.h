@@ -1,5 +1,5 @@
-// Stage 6: the adaptive threshold, a sliding 97th percentile of the onset envelope. Before:
-// beat/tempo.h (the window spans about four beats). After: beat/candidates.h.
+// Stage 6: the adaptive threshold, a sliding 97th percentile of the onset envelope. Follows
+// beat/tempo.h (the window spans about four beats); precedes beat/candidates.h.
 #ifndef TAVO_BEAT_THRESHOLD_H
 #define TAVO_BEAT_THRESHOLD_H
 
@@ -32,7 +32,7 @@ void _thd_thres_cleanup(void *record);
 }
 
 // Fills thr[F - 1] (zeroed, at least one entry) on four threads. window: analysis frames; hop:
-// seconds per analysis frame. Returns 0; TAVO_ERR_MEMORY.
+// seconds per analysis frame. Returns 0, or TAVO_ERR_MEMORY if memory runs out.
 int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, float hop, double *thr);
 
 #endif

@@ -21,19 +21,19 @@ inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *
     return true;
 }
 
-// Computes the bytes of a span of PCM: units (100 ns) * rate (Hz) * 2 / 10,000,000, divided last.
-// They may be odd.
+// Computes the size of a span of PCM in bytes: units (100 ns) * rate (Hz) * 2 / 10,000,000, with
+// the division last. The size may be odd.
 inline bool span_bytes(int64_t units, int32_t rate, int64_t *bytes) {
     return scale_size(units, rate * kBytesPerSample, kUnitsPerSecond, bytes);
 }
 
-// Computes the bytes of count elements of size bytes each, plus extra bytes.
+// Computes the size of an array in bytes: `count` * `size` + `extra`.
 inline bool array_bytes(int64_t count, int64_t size, int64_t extra, int64_t *bytes) {
     return scale_size(count, size, 1, bytes) && !__builtin_add_overflow(*bytes, extra, bytes);
 }
 
-// Allocates zeroed memory for count items, at least one. The caller frees it. Null if memory runs
-// out or the size exceeds size_t.
+// Allocates zeroed memory for `count` items, at least one. The caller frees it. Returns null if
+// memory runs out or the size exceeds size_t.
 template <typename T>
 T *zeroed_items(int64_t count) {
     const uint64_t items = count > 0 ? static_cast<uint64_t>(count) : 1;
@@ -54,19 +54,19 @@ inline void *note_shortage(void *memory) {
     return memory;
 }
 
-constexpr int64_t kLargeBytes = 4 << 20;  // the calls below pay off from this size on
+constexpr int64_t kLargeBytes = 4 << 20;  // the calls below pay off at this size and above
 
-// Asks for huge pages for a large buffer before it is filled: one page fault instead of 512, at a
+// Asks for huge pages for a large buffer before it is filled: one page fault instead of 512, in a
 // fifth of the time. The system may ignore the request.
 void advise_huge_pages(void *buffer, int64_t bytes);
 
 // Allocates uninitialised memory, at least one byte. The caller frees it. A large buffer starts at
-// a huge page, so that the allocator's header does not split the first one. Null if memory runs
-// out.
+// a huge page, so that the allocator's header does not split the first one. Returns null if memory
+// runs out.
 uint8_t *allocate_buffer(int64_t bytes);
 
-// Returns the whole pages from begin to end, within one heap buffer, to the system. They stay
-// allocated and read as zeros. Returns the end of the last page released, or begin.
+// Gives the whole pages between `begin` and `end`, both in one heap buffer, back to the system.
+// They stay allocated and read as zeros. Returns the end of the last page released, or `begin`.
 const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end);
 
 #endif

@@ -1,5 +1,5 @@
-// Vector types: several numbers in one register, by the compiler's vector extension. Each lane is
-// rounded as it would be alone. Used where the same arithmetic is done for independent data.
+// Vector types, which hold several numbers in one register, using the compiler's vector extension.
+// Each lane is rounded as it would be alone. Used where independent data needs the same arithmetic.
 #ifndef TAVO_COMMON_LANES_H
 #define TAVO_COMMON_LANES_H
 

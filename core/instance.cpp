@@ -25,8 +25,8 @@ void call_listener(TAVO_INFO *info) {
     record->listener(info, record->user);
 }
 
-// Creates an instance with its result record and the sub-contexts of its mode. Null if memory runs
-// out.
+// Creates an instance with its result record and the sub-contexts of its mode. Returns null if
+// memory runs out.
 TAVO_CTX *new_instance(int32_t mode) {
     auto *ctx = zeroed_items<TAVO_CTX>(1);
     if (ctx == nullptr) return nullptr;
@@ -58,7 +58,7 @@ TAVO_CTX *open_instance(const TAVO_PARAM *param, int32_t *err) {
     TAVO_CTX *ctx = new_instance(param->mode);
     if (ctx == nullptr) return nullptr;
     if (tavo_decode_init(ctx, param) != 0) {
-        *err = TAVO_ERR_HANDLE;  // whatever the reason, which tavo_probe returns
+        *err = TAVO_ERR_HANDLE;  // for any reason; tavo_probe reports which
         clearTavoCtx(ctx);
         return nullptr;
     }

@@ -1,7 +1,7 @@
-// The instance: its creation, its check and its release.
+// Creates, checks and releases instances.
 //
-// In: TAVO_PARAM. Out: TAVO_CTX with its sub-contexts and a planned decoding. Before: pcm/decode.h.
-// After: core/lifecycle.h.
+// Input: TAVO_PARAM. Output: TAVO_CTX with its sub-contexts and a planned decoding. Follows
+// pcm/decode.h; precedes core/lifecycle.h.
 #ifndef TAVO_CORE_INSTANCE_H
 #define TAVO_CORE_INSTANCE_H
 
@@ -24,7 +24,7 @@ bool is_instance(const TAVO_CTX *ctx);
 // True if the job has set its final state.
 bool has_ended(const TAVO_CTX *ctx);
 
-// True if a mode finds beats (a highlight). Both are false for a mode outside 0 to 2.
+// True if the mode finds beats or a highlight, respectively. Both are false outside modes 0 to 2.
 inline bool finds_beats(int32_t mode) {
     return mode == TAVO_MODE_BEATS || mode == TAVO_MODE_BOTH;
 }

@@ -1,7 +1,7 @@
-// Stages 2 to 8 in order: the job of each mode, which tavo_analyze starts on a thread.
+// The job of each mode: it runs stages 2 to 8 in order on a thread that tavo_analyze starts.
 //
-// In: TAVO_CTX with its arguments. Out: TAVO_INFO, passed to the callback exactly once, after the
-// final state is set. Before: core/lifecycle.h. After: the host's callback, jni/tavo_jni.h.
+// Input: TAVO_CTX with its arguments. Output: TAVO_INFO, passed to the callback exactly once, after
+// the final state is set. Follows core/lifecycle.h; precedes the host's callback, jni/tavo_jni.h.
 #ifndef TAVO_CORE_JOBS_H
 #define TAVO_CORE_JOBS_H
 
@@ -15,7 +15,7 @@ void *analyzeOnsetOnly(void *arg);      // mode 1
 void *analyzeOnsetFromeHi(void *arg);   // mode 2
 void *analyzeHighlight(void *arg);      // same as analyzeHighlightOnly, for direct calls
 
-// Runs only the beat analysis and its report, for an instance whose ana is filled. In mode 2 it
+// Runs only the beat analysis and its report, for an instance whose `ana` is filled. In mode 2 it
 // shifts the beats by the highlight start. Always returns TAVO_OK, after the callback. An instance
 // without an onset context reports a failure.
 int32_t analyzeOnsetenv(TAVO_CTX *ctx);

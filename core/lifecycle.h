@@ -1,8 +1,8 @@
-// The life of an instance between creation and release: its two locks, the start of its job, the
-// stop.
+// Starts and stops the job of an instance. Declares the two locks that exist from the creation of
+// an instance to its release.
 //
-// In: the calls of include/tavo.h. Out: a job of core/jobs.h on its own thread. Before:
-// core/instance.h, core/jobs.h. After: the host.
+// Input: the calls of include/tavo.h. Output: a job of core/jobs.h on its own thread. Follows
+// core/instance.h and core/jobs.h; precedes the host.
 #ifndef TAVO_CORE_LIFECYCLE_H
 #define TAVO_CORE_LIFECYCLE_H
 

@@ -18,8 +18,8 @@ struct complex_copy {
     double *im;
 };
 
-// Allocates count complex values. Copies the first used values of re, and of im unless it is null;
-// the rest is zero.
+// Allocates `count` complex values. Copies the first `used` values of `re`, and of `im` unless it
+// is null; the rest are zero.
 bool copy_input(complex_copy *copy, const double *re, const double *im, int64_t used,
                 int64_t count) {
     if (count > kMaxCopy) return false;
@@ -53,7 +53,7 @@ bool transform_fast(double *re, double *im, int64_t n) {
     return true;
 }
 
-// Skips the inputs from used on, which are zero.
+// Skips the inputs at index `used` and above, which are zero.
 void forward_sums(double *re, double *im, int64_t n, const complex_copy &x, int64_t used,
                   bool real_input) {
     for (int64_t k = 0; k < n; ++k) {

@@ -7,13 +7,13 @@
 
 extern "C" {
 
-// Replaces re[n], im[n] by the transform of their first m values; the others count as zero. With
-// real_input the imaginary input is ignored. Returns 0; TAVO_ERR_MEMORY, with nothing changed.
+// Replaces re[n], im[n] with the transform of their first m values; the others count as zero. If
+// real_input is not 0, im is not read. Returns 0, or TAVO_ERR_MEMORY with nothing changed.
 int32_t tavo_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_input);
 
-// Replaces the first m values of re[n], im[n] by those of the inverse transform and leaves the
-// others unchanged. With real_input the imaginary input is ignored. Returns 0; TAVO_ERR_MEMORY,
-// with nothing changed.
+// Replaces the first m values of re[n], im[n] with those of the inverse transform and leaves the
+// others unchanged. If real_input is not 0, the imaginary input is ignored. Returns 0, or
+// TAVO_ERR_MEMORY with nothing changed.
 int32_t tavo_inverse_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_input);
 }
 

@@ -6,7 +6,7 @@
 
 namespace {
 
-constexpr uint32_t kMaxReverseBits = 31;  // bit_reverse2 returns 0 beyond it
+constexpr uint32_t kMaxReverseBits = 31;  // bit_reverse2 returns 0 for more
 
 int32_t count_halvings(size_t n) {
     int32_t count = 0;
@@ -123,8 +123,8 @@ void run_two_stages(const spectrum<T> &x, size_t half, size_t size, const TAVO_F
     }
 }
 
-// Runs the stages from the one whose butterflies have inputs half elements apart to the one before
-// end elements.
+// Runs the stages whose butterfly inputs are `half`, 2 * `half`, ... elements apart, up to but not
+// including `end`.
 template <typename T>
 void run_stages(const spectrum<T> &x, size_t half, size_t end, size_t size,
                 const TAVO_FFT_CTX *ctx) {
@@ -161,9 +161,9 @@ inline double_pair windowed(const frame_pair &frames, size_t i) {
 
 constexpr size_t kFirstGroup = 8;  // elements that the first three stages combine
 
-// Runs the first three stages on the eight windowed samples i, i + step, ..., i + 7 * step and
-// stores the results from x[first] on. Multiplications by 1 and by zero imaginary parts are
-// skipped; if the results are finite, this changes only the sign of zeros.
+// Runs the first three stages on the eight windowed samples at i, i + step, ..., i + 7 * step and
+// stores the results in x, starting at x[first]. Skips multiplications by 1 and by zero imaginary
+// parts; if the results are finite, this changes only the sign of zeros.
 inline void start_group(const frame_pair &frames, size_t i, size_t step, size_t first,
                         const spectrum<double_pair> &x, const TAVO_FFT_CTX *ctx) {
     const double_pair zero = {0.0, 0.0};

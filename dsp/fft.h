@@ -20,7 +20,7 @@ inline bool is_fft_size(int64_t n) {
 struct TAVO_FFT_CTX {
     double *cos_table;      // [N] cos(2 pi k / N) in the first N / 2 entries
     double *sin_table;      // [N] -sin(2 pi k / N) in the first N / 2 entries
-    uint32_t *bit_reverse;  // [N] the bit-reversed index where it is at least i, else 0
+    uint32_t *bit_reverse;  // [N] for index i, its bit reversal if that is at least i, else 0
     int32_t stages;         // log2 N
 };
 static_assert(sizeof(void *) != 8 || offsetof(TAVO_FFT_CTX, stages) == 24);
@@ -49,9 +49,9 @@ struct frame_pair {
     const double *window;  // [n]
 };
 
-// Computes the powers of the bins below n / 2 of two windowed frames, n as given to init, each
-// rounded to single precision: powers[n / 2]. Bit-identical to those after tavo_fft_proc on each
-// frame. scratch: [2 n].
+// Fills powers[n / 2] with the powers of the bins below n / 2 of two windowed frames, each rounded
+// to single precision and bit-identical to those after tavo_fft_proc on each frame. n: the size
+// given to tavo_fft_init. scratch: [2 n].
 void compute_frame_powers(const frame_pair &frames, int32_t n, const TAVO_FFT_CTX *ctx,
                           double_pair *scratch, double_pair *powers);
 

@@ -27,8 +27,8 @@ int64_t count_peaks(const Sample *x, int64_t len) {
     return count;
 }
 
-// Returns the count peaks of x[len] in ascending order; the caller frees them. Null if memory runs
-// out.
+// Returns the `count` peaks of x[len] in ascending order; the caller frees them. Returns null if
+// memory runs out.
 template <typename Record, typename Sample>
 Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
     auto *peaks =
@@ -44,9 +44,9 @@ Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
     return peaks;
 }
 
-// Suppresses the positions within radius of index. A larger peak in that range cannot have
+// Suppresses the positions within `radius` of `index`. A larger peak in that range cannot have
 // survived, or it would have suppressed this one, so marking it again changes nothing. Survivors
-// are more than radius apart, so all calls together mark each position at most three times.
+// are more than `radius` apart, so all calls together mark each position at most three times.
 void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius) {
     if (radius < 0) return;
     const int64_t begin = index > radius ? index - radius : 0;
@@ -54,7 +54,7 @@ void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius)
     memset(marks + begin, kSuppressed, static_cast<size_t>(end - begin + 1));
 }
 
-// Writes the surviving peaks, largest first, limit at most. Returns how many it wrote.
+// Writes the surviving peaks, largest first, at most `limit`. Returns how many it wrote.
 template <typename Record, typename Index>
 int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int64_t len,
                         int64_t radius, int64_t limit, Index *out) {
@@ -68,7 +68,7 @@ int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int6
     return written;
 }
 
-// Suppresses the positions within radius of any priority position, in two sweeps.
+// Suppresses the positions within `radius` of any priority position, in two sweeps.
 void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t radius) {
     int64_t distance = kFar;  // to the nearest priority position on the side already swept
     for (int64_t i = 0; i < len; ++i) {

@@ -1,7 +1,7 @@
 // Stage 7: the highlight start of a decoded song.
 //
-// In: TAVO_CTX with pcm, pcm_bytes, fmt, duration. Out: hl.hl_pos, milliseconds.
-// Before: pcm/decode.h. After: the callback, or pcm/from_highlight.h in mode 2.
+// Input: TAVO_CTX with pcm, pcm_bytes, fmt, duration. Output: hl.hl_pos, milliseconds. Follows
+// pcm/decode.h; precedes the callback, or pcm/from_highlight.h in mode 2.
 #ifndef TAVO_HIGHLIGHT_POSITION_H
 #define TAVO_HIGHLIGHT_POSITION_H
 

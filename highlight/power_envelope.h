@@ -1,7 +1,7 @@
 // Stage 7a: the loudness curve of the song.
 //
-// In: 16-bit mono PCM at the source rate. Out: TAVO_HL_CTX.power, one float every 2 s for a window
-// of 6 s: 10 log10(mean square + 1), 0 for silence, about 3.01 for full scale. After:
+// Input: 16-bit mono PCM at the source rate. Output: TAVO_HL_CTX.power, one float every 2 s for a
+// window of 6 s: 10 log10(mean square + 1), 0 for silence, about 3.01 for full scale. Precedes
 // highlight/search.h.
 #ifndef TAVO_HIGHLIGHT_POWER_ENVELOPE_H
 #define TAVO_HIGHLIGHT_POWER_ENVELOPE_H
@@ -24,11 +24,11 @@ int32_t _calc_power_level(const int16_t *pcm, int64_t sample_count, int32_t rate
 constexpr double kInverseHead = 0x1p-15 + 0x1p-30 + 0x1p-45;
 constexpr double kInverseTail = 0x1p-60 + 0x1p-75;
 
-// 10 log10(mean square + 1) of window samples. The sum is double, the rest single precision.
+// 10 log10(mean square + 1) of `window` samples. The sum is double, the rest single precision.
 float window_power(const int16_t *pcm, int64_t window);
 
-// Computes window_power for count windows of 3 hop samples, one hop apart, into out[count]. pcm:
-// [(count + 2) hop].
+// Computes window_power for `count` windows of 3 * hop samples, one hop apart, into out[count].
+// pcm: [(count + 2) * hop].
 void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *out);
 
 #endif

@@ -32,8 +32,8 @@ int64_t distance(int64_t a, int64_t b) {
     return a < b ? b - a : a - b;
 }
 
-// Walks along list from index first towards index last, as long as each entry is strictly nearer to
-// ideal than the one before. step is 1 or -1.
+// Walks along `list` from index `first` towards index `last`, as long as each entry is strictly
+// nearer to `ideal` than the one before. step is 1 or -1.
 candidate walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_t last,
                        int32_t step) {
     int32_t k = first;
@@ -45,21 +45,21 @@ candidate walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_
     return {true, k == last, list[k], nearest};
 }
 
-// Index of the last valley at or before chosen, or -1.
+// Index of the last valley at or before `chosen`, or -1.
 int32_t valley_before(const song_curve *song, int32_t chosen) {
     int32_t k = 0;
     while (k < song->nv && song->valleys[k] <= chosen) ++k;
     return k - 1;
 }
 
-// True if the loudness at idx is below last and then stays below the mean. Points past the end of
-// the song do not count as below.
+// True if the loudness at `idx` is below `last` and then stays below the mean. Points past the end
+// of the song do not count as below.
 bool is_drop(const song_curve *song, int32_t idx, float last) {
     if (!(song->norm[idx] < last) || idx + 3 >= song->n) return false;
     return (song->norm[idx + 2] + song->norm[idx + 3]) * 0.5f < song->mean;
 }
 
-// End of the loud segment that contains chosen, or fallback.
+// End of the loud segment that contains `chosen`, or `fallback` if none does.
 int32_t segment_end(const song_curve *song, int32_t chosen, int32_t fallback) {
     for (int32_t k = 0; k < song->nseg; ++k) {
         if (song->pairs[2 * k] <= chosen && chosen < song->pairs[2 * k + 1]) {
@@ -69,7 +69,7 @@ int32_t segment_end(const song_curve *song, int32_t chosen, int32_t fallback) {
     return fallback;
 }
 
-// End of the region that starts at chosen, used if no valley bounds it.
+// End of the region that starts at `chosen`, used if no valley bounds it.
 int32_t scan_for_end(const song_curve *song, int32_t chosen) {
     const float reference = song->norm[chosen];
     float last = reference;
@@ -98,8 +98,8 @@ int32_t scan_for_end(const song_curve *song, int32_t chosen) {
     return found ? drop_pos : segment_end(song, chosen, lowest_pos);
 }
 
-// Start of a region that should begin lead points before chosen. before: index of the valley at or
-// before chosen, or -1.
+// Start of a region that should begin `lead` points before `chosen`. before: index of the valley at
+// or before `chosen`, or -1.
 int64_t choose_start(const song_curve *song, int32_t chosen, int32_t before, int64_t lead) {
     const int64_t ideal = chosen - lead;
     candidate valley = {};
@@ -122,7 +122,7 @@ int64_t choose_start(const song_curve *song, int32_t chosen, int32_t before, int
     return ideal > 0 ? ideal : 0;
 }
 
-// Returns start, or an earlier point if the region would extend past the end of the song.
+// Returns `start`, or an earlier point if the region would extend past the end of the song.
 int64_t fit_in_song(const song_curve *song, int64_t start, int32_t len_pts) {
     if (start + len_pts <= song->n) return start;
     const int64_t valley = song->nv > 0 ? song->valleys[0] : 0;

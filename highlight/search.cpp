@@ -70,7 +70,7 @@ bool rank_curve(const float *power, int32_t n, float *largest, float *percentile
 
 void find_segments(search_state *s) {
     bool above =
-        false;  // even if point 0 is: a song that is loud from the start has a segment from 0 on
+        false;  // even if point 0 is above: a song loud from the start has a segment from point 0
     for (int32_t k = 0; k < s->n - 1 && s->nseg < kMaxSegments; ++k) {
         const bool next_above = s->norm[k + 1] > s->mean;
         if (!above && next_above) s->start[s->nseg] = k;
@@ -86,7 +86,7 @@ void find_segments(search_state *s) {
     }
 }
 
-// Points from pos to the next valley; 0 if no valley follows.
+// Points from `pos` to the next valley; 0 if no valley follows.
 int32_t valley_distance(const search_state *s, int32_t pos) {
     for (int32_t k = 0; k < s->nv; ++k) {
         if (s->valley[k] > pos) return s->valley[k] - pos;
@@ -94,7 +94,7 @@ int32_t valley_distance(const search_state *s, int32_t pos) {
     return 0;
 }
 
-// True if pos is in a loud segment that lasts long enough after pos.
+// True if `pos` is in a loud segment that lasts long enough after it.
 bool is_in_segment(const search_state *s, int32_t pos) {
     if (pos > s->n - s->tail) return false;
     for (int32_t k = 0; k < s->nseg; ++k) {

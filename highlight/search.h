@@ -1,7 +1,7 @@
 // Stage 7b: searches the loudness curve for the coarse highlight start.
 //
-// In: TAVO_HL_CTX with power filled. Out: a time in milliseconds, a multiple of 2000.
-// Before: highlight/power_envelope.h. After: highlight/tune.h.
+// Input: TAVO_HL_CTX with power filled. Output: a time in milliseconds, a multiple of 2000. Follows
+// highlight/power_envelope.h; precedes highlight/tune.h.
 #ifndef TAVO_HIGHLIGHT_SEARCH_H
 #define TAVO_HIGHLIGHT_SEARCH_H
 

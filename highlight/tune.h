@@ -1,7 +1,7 @@
 // Stage 7d: moves the coarse highlight start to the sharpest rise near it.
 //
-// In: 16-bit mono PCM at the source rate, a start in milliseconds. Out: the start on a grid of 400
-// ms. Before: highlight/search.h. After: highlight/position.h.
+// Input: 16-bit mono PCM at the source rate, a start in milliseconds. Output: the start on a grid
+// of 400 ms. Follows highlight/search.h; precedes highlight/position.h.
 #ifndef TAVO_HIGHLIGHT_TUNE_H
 #define TAVO_HIGHLIGHT_TUNE_H
 
@@ -9,8 +9,8 @@
 
 extern "C" {
 
-// Returns the sharpest rise (ms) between 3 s before and 7 s after start_ms; start_ms itself if no
-// rise is sharp enough. pcm must have at least tune_end samples.
+// Returns the time (ms) of the sharpest rise between 3 s before and 7 s after start_ms; start_ms if
+// no rise is sharp enough. pcm must have at least tune_end samples.
 uint32_t _tune_HL_simple(const int16_t *pcm, int32_t rate, uint32_t start_ms, uint32_t duration_s);
 }
 

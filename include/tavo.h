@@ -1,8 +1,8 @@
 /** @file
  * The public C interface of libtavo: the highlight and the beats of a song.
  *
- * In: the path of an audio file and an analysis mode. Out: one TAVO_INFO, delivered once through a
- * callback on a thread of the library. A complete program:
+ * The input is the path of an audio file and an analysis mode. The result is one TAVO_INFO,
+ * delivered once through a callback on a thread of the library. A complete program:
  *
  * @code{.c}
  * #include <semaphore.h>
@@ -31,7 +31,7 @@
  * @endcode
  *
  * The library does not analyse two files at a time in one process, take audio from memory, or
- * report progress. Use several processes for several files.
+ * report progress. To analyse several files at once, use several processes.
  *
  * States of an instance, and what each call returns in it:
  *
@@ -79,7 +79,7 @@ enum {
     TAVO_ERR_MEMORY = -2,    /**< out of memory, or a thread could not be started */
     TAVO_ERR_FORMAT = -3,    /**< unusable file: format, stream parameters, length, rate */
     TAVO_ERR_HANDLE = -4,    /**< bad handle or argument; from tavo_init: the file is unusable */
-    TAVO_ERR_NOT_READY = -5, /**< the job of the instance was started before */
+    TAVO_ERR_NOT_READY = -5, /**< the job of the instance has already been started */
     TAVO_ERR_READ = -6,      /**< a media source could not read or decode */
     TAVO_ERR_OPEN = -7,      /**< a file cannot be opened or has no usable audio stream */
     TAVO_ERR_SHORT = -8,     /**< tavo_probe: the audio lasts 1 s or less */
@@ -142,8 +142,8 @@ typedef void (*TAVO_CALLBACK)(TAVO_INFO *info);
 typedef void (*TAVO_LISTENER)(TAVO_INFO *info, void *user);
 
 /** Opens a file, reads its format and closes it, to find out whether tavo_init can use it. Needs no
- * instance. If the result is 0, -8 or -9, *stream receives the stream; otherwise it is zeroed.
- * stream may be null.
+ * instance. If the result is 0, -8 or -9, *stream receives the stream's properties; otherwise it is
+ * zeroed. stream may be null.
  *
  * Returns 0 if the file can be used, or the reason why it cannot:
  * - -2: out of memory;
@@ -178,7 +178,7 @@ void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback);
 /** Stores a listener instead of a callback, and the pointer to pass to it, which the library
  * does not read. Call it before tavo_analyze, on an instance that tavo_init returned. The last
  * call of tavo_setcallback or tavo_set_listener counts. A null listener removes it. Returns 0;
- * -4 bad handle, with nothing stored. */
+ * -4 for a bad handle, with nothing stored. */
 int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 
 /** Starts the one job of the instance on its own thread and returns immediately.
@@ -186,18 +186,18 @@ int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
  * - max_beats: maximum number of threshold-selected beats; 0 or less for no limit (modes 1 and 2).
  * - beat_param2: not used.
  *
- * Returns 0 started; -2 the thread could not be started (the instance stays ready); -4 bad handle,
- * or a mode outside 0 to 2; -5 started before. The callback is called only if it returned 0. */
+ * Returns 0 if started; -2 if the thread could not be started (the instance stays ready); -4 for a
+ * bad handle or a mode outside 0 to 2; -5 if already started. Only a 0 leads to a callback. */
 int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_beats, int32_t beat_param2);
 
 /** Stops a running job, waits until its callback has returned, and releases the instance. Decoding
  * and the highlight search run to their end before the job stops.
- * Returns 0; -4 bad handle, or called from inside the callback, with nothing changed. */
+ * Returns 0, or -4 for a bad handle or a call from inside the callback, with nothing changed. */
 int32_t tavo_deinit(TAVO_CTX *ctx);
 
-/** Gives the stream's sample rate in Hz, the channels of the decoder's output, and the duration
- * in ms that the file states. A value with a null pointer is skipped. Valid after tavo_init.
- * Returns 0; -4 bad handle, with nothing written. */
+/** Stores the stream's sample rate in Hz, the channels of the decoder's output, and the duration
+ * in ms that the file states. Null pointers are skipped. Valid after tavo_init. Returns 0, or -4
+ * for a bad handle, with nothing written. */
 int32_t tavo_get_stream(const TAVO_CTX *ctx, int32_t *rate, int32_t *channels,
                         int64_t *duration_ms);
 
@@ -213,8 +213,8 @@ int32_t tavo_get_tempo(const TAVO_CTX *ctx);
 int32_t tavo_has_audio(const TAVO_CTX *ctx);
 
 /** Returns 1 if the job decoded the file to its end; call it in the callback or after it. Returns
- * 0 if the file could not be read to its end or memory ran out; the result is then that of the part
- * that was analysed. Also returns 0 before the end of the job and for a bad handle. */
+ * 0 if the file could not be read to its end or memory ran out; the result then covers only what
+ * was analysed. Also returns 0 before the end of the job and for a bad handle. */
 int32_t tavo_is_complete(const TAVO_CTX *ctx);
 
 /** Returns the loudness curve of the file, once a job of mode 0 or 2 has ended. Value i is
@@ -225,7 +225,7 @@ int32_t tavo_is_complete(const TAVO_CTX *ctx);
  * window, or for a bad handle. count must not be null. */
 const float *tavo_get_loudness(const TAVO_CTX *ctx, int32_t *count);
 
-/** An open file whose samples are read from its start on. Its fields are private. */
+/** An open file whose samples are read from start to end. Its fields are private. */
 typedef struct mtsrc_ctx mtsrc_ctx;
 
 /** The input of mtsrc_init, which copies the path. */
@@ -241,17 +241,17 @@ typedef struct mtsrc_frame {
 
 /** Opens a file to read its samples, for instance to draw them; an analysis does not need it.
  * Returns a handle, which the caller releases with mtsrc_deinit, with *err 0. On failure returns
- * null with *err -2 out of memory; -3 unknown or unsupported format, or path too long; -4 no path;
- * -6 cannot be read, or shorter than 16 bytes; -7 cannot be opened, or no usable audio; -255 codec
- * library. */
+ * null and sets *err: -2 out of memory; -3 unknown or unsupported format, or path too long; -4 no
+ * path; -6 file unreadable or shorter than 16 bytes; -7 file cannot be opened, or has no usable
+ * audio; -255 the codec library failed. */
 mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err);
 
-/** Delivers want bytes; up to 917,506 bytes always fit. Returns 0 if it delivered exactly want
- * bytes; 1 if the stream ended, with the remaining bytes delivered; -2 out of memory; -4 bad handle
- * or frame, or want negative or too large; -6 read or decode failure. */
+/** Delivers `want` bytes; up to 917,506 bytes always fit. Returns 0 if it delivered all of them; 1
+ * if the stream ended, with the remaining bytes delivered; -2 if memory ran out; -4 for a bad
+ * handle or frame, or if `want` is negative or too large; -6 if reading or decoding failed. */
 int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
 
-/** Releases everything. Returns -5 (done); -4 bad handle. */
+/** Releases everything. Returns -5 on success, -4 for a bad handle. */
 int32_t mtsrc_deinit(mtsrc_ctx *src);
 
 /** The path of the diagnostic click track (mono 16-bit WAV at 11025 Hz). Modes 1 and 2 write it

@@ -71,8 +71,8 @@ long handle_value(const TAVO_CTX *ctx) {
 
 // ---- the lock of init and deinit ----
 
-// Creates the lock on first use, and locks it. Two threads that come first at the same time get the
-// same lock.
+// Creates the lock on first use, and locks it. Two threads that race to create it get the same
+// lock.
 pthread_mutex_t *lock_for_init() {
     pthread_mutex_t *mutex = nullptr;
     const bool created = __atomic_compare_exchange_n(&tavo_jni_mutex, &mutex, &lifecycle_mutex,

@@ -1,8 +1,8 @@
 // Stage 8: the Java bridge.
 //
-// In: the native methods of com.kestu.tavo.Tavo, for one instance per process. Out: one call of the
-// class's static postEventFromNative per job, on the job's worker thread. Before: include/tavo.h.
-// After: java/com/kestu/tavo/Tavo.java.
+// Input: the native methods of com.kestu.tavo.Tavo, for one instance per process. Output: one call
+// of the class's static postEventFromNative per job, on the job's worker thread. Follows
+// include/tavo.h; precedes java/com/kestu/tavo/Tavo.java.
 #ifndef TAVO_JNI_TAVO_JNI_H
 #define TAVO_JNI_TAVO_JNI_H
 

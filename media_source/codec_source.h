@@ -1,8 +1,8 @@
-// Stage 1, below mtsrc.h: the code that all formats except WAV share. A codec source pairs a
-// container with a codec of the codec library.
+// Part of stage 1, below mtsrc.h: the code that all formats except WAV share. A codec source pairs
+// a container with a codec of the codec library.
 //
-// In: the library's reader or demuxer and its decoder, in the handle. Out: PCM in the queue. Called
-// by the operations of each format.
+// Input: the library's reader or demuxer and its decoder, in the handle. Output: PCM in the queue.
+// Called by the operations of each format.
 #ifndef TAVO_MEDIA_SOURCE_CODEC_SOURCE_H
 #define TAVO_MEDIA_SOURCE_CODEC_SOURCE_H
 
@@ -22,7 +22,7 @@ struct container_ops {
     int32_t (*seek)(void *stream, const int64_t *position, int64_t *reached);
     void (*close_stream)(void *stream);  // null for a bare stream
     void (*remove)(void *demux);         // deletes the demuxer or the reader
-    void (*deinit)();                    // for all codecs that the open initialised
+    void (*deinit)();                    // shuts down every codec that the open initialised
 };
 
 struct codec_ops {
@@ -48,17 +48,17 @@ struct codec_source {
 // Index of the first audio track or stream, or -1.
 int32_t codec_source_first_audio(const int32_t *kinds, int32_t count);
 
-// The two usual reductions: to the first channel, and none for PCM that has one channel already.
+// The two usual reductions: to the first channel, and none, for PCM that already has one channel.
 int32_t codec_source_reduce_to_first(const mtsrc_ctx *src, int32_t bytes, int64_t first);
 int32_t codec_source_reduce_none(const mtsrc_ctx *src, int32_t bytes, int64_t first);
 
 // Begins every open. init: the codec library's function; it returns 0 on success. Returns 0 with
-// demux, dstream and decoder null; TAVO_ERR_HANDLE null handle; TAVO_ERR_OPEN no probe file;
-// TAVO_ERR_CODEC init failed.
+// demux, dstream and decoder null; TAVO_ERR_HANDLE for a null handle; TAVO_ERR_OPEN if there is no
+// probe file; TAVO_ERR_CODEC if init failed.
 int32_t codec_source_begin_open(mtsrc_ctx *src, int32_t (*init)());
 
-// Stores the decoder, which may be null, and the stream's format in the handle, which owns the
-// decoder. Returns 0; TAVO_ERR_CODEC no decoder; TAVO_ERR_FORMAT sample rate not supported.
+// Stores the decoder (may be null) and the stream's format in the handle, which owns the decoder.
+// Returns 0, TAVO_ERR_CODEC without a decoder, or TAVO_ERR_FORMAT for an unsupported sample rate.
 int32_t codec_source_set_decoder(mtsrc_ctx *src, const codec_ops &codec, void *decoder,
                                  const mtsrc_format &format);
 

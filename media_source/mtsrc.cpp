@@ -15,7 +15,7 @@ bool is_open(const mtsrc_ctx *src) {
     return src != nullptr && memcmp(&src->mark, kMark, sizeof src->mark) == 0;
 }
 
-// Allocates a handle with its queue and lock. Null if memory runs out.
+// Allocates a handle with its queue and lock. Returns null if memory runs out.
 mtsrc_ctx *new_handle(const mtsrc_io *io) {
     auto *src = static_cast<mtsrc_ctx *>(calloc(1, sizeof(mtsrc_ctx)));
     if (src == nullptr) return nullptr;

@@ -2,8 +2,8 @@
 /// Stage 1: turns an audio file into a stream of 16-bit mono PCM. The caller reads it in requests
 /// of any size and seeks by time.
 ///
-/// In: a path. Out: PCM at the stream's own rate, native byte order. Called by pcm/decode.h. A
-/// source is used by one thread at a time; different sources share nothing. The handle,
+/// Input: a path. Output: PCM at the stream's own rate, native byte order. Called by pcm/decode.h.
+/// A source is used by one thread at a time; different sources share nothing. The handle,
 /// mtsrc_init, mtsrc_getstream and mtsrc_deinit are declared in tavo.h.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_H
 #define TAVO_MEDIA_SOURCE_MTSRC_H
@@ -43,19 +43,19 @@ extern "C" {
 /// mtsrc_init does. flags: unused, pass 0.
 mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t flags, int32_t *err);
 
-/// Returns 0; -4 bad handle or null fmt.
+/// Returns 0, or -4 for a bad handle or a null fmt.
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt);
 
-/// Seeks to position (100-ns units). The reader stores in *reached where reading resumes. Set
-/// *reached before the call, because a reader may leave it unchanged. Returns 0; -4 bad handle or
-/// failed seek, after which the queue is empty.
+/// Seeks to `position` (100-ns units). The reader stores in *reached where reading resumes. Set
+/// *reached before the call, because a reader may leave it unchanged. Returns 0, or -4 for a bad
+/// handle or a failed seek; after a failed seek the queue is empty.
 int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached);
 
-/// Empties the queue and resets the decoder. Returns -5 (done); -4 bad handle.
+/// Empties the queue and resets the decoder. Returns -5 on success, -4 for a bad handle.
 int32_t mtsrc_reset(mtsrc_ctx *src);
 
-/// Recognises an open file by its content and restores the file offset. Returns 0 with *type set,
-/// kMtsrcTypeUnknown if no probe matches; -6 if 16 bytes cannot be read.
+/// Recognises an open file by its content and restores the file offset. Returns 0 and sets *type
+/// (to kMtsrcTypeUnknown if no probe matches), or returns -6 if 16 bytes cannot be read.
 int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type);
 
 /// The probes, in the order in which they are called. head: the first 16 bytes of the file. They

@@ -11,10 +11,10 @@
 
 constexpr int32_t kQueueBytes = 1'048'576;  // q_cap
 // Extra bytes allocated after q_cap. The largest FLAC block decodes to 262,140 bytes of stereo, but
-// before each frame only 131,070 free bytes, its size in mono, are certain.
+// only 131,070 free bytes, its size in mono, are guaranteed before each frame.
 constexpr int32_t kQueueSpareBytes = 131'070;
 
-// Codec codes of the codec library. Each compressed frame is passed to its decoder with one.
+// Codec codes of the codec library. A decoder receives one with each compressed frame.
 constexpr int32_t kCodecMpeg = 305;
 constexpr int32_t kCodecAac = 306;
 constexpr int32_t kCodecFlac = 322;

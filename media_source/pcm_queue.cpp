@@ -23,7 +23,7 @@ void deliver(mtsrc_ctx *src, int32_t bytes, mtsrc_frame *frame) {
     src->q_fill -= bytes;
 }
 
-// Returns 0 if the queue holds want bytes, otherwise the code that ends the call.
+// Returns 0 if the queue holds `want` bytes, otherwise the code that ends the call.
 int32_t fill_queue(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill &fill) {
     int32_t empty_steps = 0;
     while (src->q_fill < want) {

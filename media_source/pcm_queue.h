@@ -1,8 +1,8 @@
 // The queue between a source's decoder and the caller. Decoded PCM is written at q_wr and read at
 // q_rd in requests of any size.
 //
-// In: 16-bit interleaved PCM of one compressed frame. Out: one channel, as many bytes as the caller
-// requests.
+// Input: 16-bit interleaved PCM of one compressed frame. Output: one channel, as many bytes as the
+// caller requests.
 #ifndef TAVO_MEDIA_SOURCE_PCM_QUEUE_H
 #define TAVO_MEDIA_SOURCE_PCM_QUEUE_H
 
@@ -21,10 +21,10 @@ void pcm_queue_clear(mtsrc_ctx *src);
 // Adds bytes that were written at q_wr, at most q_room.
 void pcm_queue_push(mtsrc_ctx *src, int32_t bytes);
 
-// The body of every get_frm: fills the queue until it holds want bytes, and delivers them. Returns
-// 0; kMtsrcEndOfStream with the remaining bytes delivered; TAVO_ERR_MEMORY; TAVO_ERR_HANDLE for a
-// bad frame, or if want is negative or greater than the queue can hold (bytes in the queue stay
-// there); TAVO_ERR_READ if the steps never add anything; otherwise the code of the step.
+// The body of every get_frm: fills the queue until it holds `want` bytes, and delivers them.
+// Returns 0; kMtsrcEndOfStream with the remaining bytes delivered; TAVO_ERR_MEMORY for lack of
+// memory; TAVO_ERR_HANDLE for a bad frame, or if `want` is negative or more than the queue can hold
+// (its bytes stay there); TAVO_ERR_READ if no step adds anything; otherwise the step's code.
 int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pcm_fill &fill);
 
 // Reduce interleaved PCM to one channel: the first, or the mean of the first two. dst may equal

@@ -33,7 +33,7 @@ struct frame_header {
     bool padded;
 };
 
-// Parses the three bytes of a header. Returns false if they cannot be one.
+// Parses the first three bytes of a header. Returns false if no header starts with them.
 bool parse(const uint8_t *bytes, frame_header *header) {
     *header = {(bytes[1] >> 3) & 3, (bytes[1] >> 1) & 3, bytes[2] >> 4, (bytes[2] >> 2) & 3,
                (bytes[2] & 2) != 0};

@@ -29,7 +29,7 @@ constexpr container_ops kMp4 = {
 };
 constexpr codec_source kAacInMp4 = {&kMp4, &kAacCodec, codec_source_reduce_to_first};
 constexpr codec_source kMpegInMp4 = {&kMp4, &kMpegCodec, codec_source_reduce_to_first};
-// Delivers only what is in the queue.
+// For other codecs, which have no decoder: delivers only what is in the queue.
 constexpr codec_source kOtherInMp4 = {&kMp4, nullptr, codec_source_reduce_to_first};
 
 const codec_source &source_of(const mtsrc_ctx *src) {

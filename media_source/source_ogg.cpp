@@ -1,4 +1,4 @@
-// Vorbis in Ogg. The decoder is created with the stream's set-up data and gives one channel.
+// Vorbis in Ogg. The decoder is created with the stream's set-up data and outputs one channel.
 #include <algorithm>
 #include <cstdlib>
 

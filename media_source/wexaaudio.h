@@ -2,9 +2,9 @@
 // format sources of stage 1. It is a contract, not an implementation. Another binary reads the
 // records, so each offset is asserted.
 //
-// Readers open the file through the callbacks of mtsrc_io. Results: 0 success, kWexaEndOfStream,
-// anything else failure. Times are in 100-ns units unless stated otherwise. Objects of different
-// sources are used on different threads at the same time.
+// Readers open the file through the callbacks of mtsrc_io. Results are 0 on success,
+// kWexaEndOfStream at the end, anything else on failure. Times are in 100-ns units unless stated
+// otherwise. Objects of different sources are used on different threads at the same time.
 //
 // A "frame" is what a library's reader passes to its own decoder: compressed bytes, or PCM that the
 // reader has already decoded and the decoder copies. A source depends only on its byte count.
@@ -188,7 +188,7 @@ static_assert(sizeof(void *) != 8 ||
               (offsetof(wexa_frame, bytes) == 16 && offsetof(wexa_frame, codec) == 24));
 static_assert(sizeof(void *) != 8 || sizeof(wexa_frame) == 96);
 
-// Output of a decoder: bytes of interleaved 16-bit PCM at data, a buffer of the caller's.
+// Output of a decoder: bytes of interleaved 16-bit PCM at data, a buffer that the caller owns.
 struct wexa_output {
     uint8_t reserved_0[32];
     int32_t bytes;

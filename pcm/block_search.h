@@ -1,7 +1,7 @@
-// Finds a block of 200 bytes in a buffer of PCM, where two decodings hold the same audio.
+// Finds a block of 200 bytes in a buffer of PCM, to locate the same audio in two decodings.
 //
-// In: the block and the offsets to test. Out: an offset. Called by pcm/stitch.cpp for the splice
-// points and by pcm/from_highlight.cpp for the position of a seek.
+// Input: the block and the offsets to test. Output: an offset. Called by pcm/stitch.cpp for the
+// splice points and by pcm/from_highlight.cpp for the position of a seek.
 #ifndef TAVO_PCM_BLOCK_SEARCH_H
 #define TAVO_PCM_BLOCK_SEARCH_H
 
@@ -10,8 +10,8 @@
 constexpr int64_t kBlockBytes = 200;
 constexpr int64_t kNotFound = -1;
 
-// Byte offsets at which the block may begin, first to end - 1. At each of them kBlockBytes bytes
-// can be read.
+// Byte offsets at which the block may begin, `first` to `end` - 1. kBlockBytes bytes can be read at
+// each of them.
 struct offset_range {
     int64_t first;
     int64_t end;

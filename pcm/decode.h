@@ -1,8 +1,8 @@
 // Stage 2: decodes the file into one buffer of 16-bit mono PCM at the stream's own rate.
 //
-// In: a plan of pcm/decode_plan.h. Out: TAVO_CTX.pcm, pcm_bytes bytes. The segments are decoded in
-// parallel and joined where their overlaps hold the same bytes (pcm/stitch.h). After:
-// highlight/position.h, pcm/resample.h.
+// Input: a plan of pcm/decode_plan.h. Output: TAVO_CTX.pcm, pcm_bytes bytes. The segments are
+// decoded in parallel and joined where their overlaps hold the same bytes (pcm/stitch.h). Precedes
+// highlight/position.h and pcm/resample.h.
 #ifndef TAVO_PCM_DECODE_H
 #define TAVO_PCM_DECODE_H
 

@@ -42,7 +42,7 @@ int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
 }
 
 // Sets the length of a segment of the current plan, allocates its buffer and seeks its source to
-// start.
+// `start`.
 int32_t plan_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_len) {
     TAVO_DECSEG *seg = &ctx->seg[index];
     const int32_t count = ctx->seg_count;
@@ -56,7 +56,7 @@ int32_t plan_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_le
     seg->buf = allocate_buffer(seg->cap);
     if (seg->buf == nullptr) return TAVO_ERR_MEMORY;
 
-    seg->seek_pos = start;  // stays if the seek fails without reporting a position
+    seg->seek_pos = start;  // unchanged if the seek fails without reporting a position
     mtsrc_seekstream(seg->src, start, &seg->seek_pos);
     return 0;
 }
@@ -92,7 +92,7 @@ int32_t allocate_table(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     return 0;
 }
 
-// Builds the whole plan. After a failure the caller releases what exists with tavo_decode_deinit.
+// Builds the whole plan. After a failure the caller must call tavo_decode_deinit.
 int32_t build_decoding(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     int32_t err = worker_lock_create(&ext_mutex_mt, &ext_cond_mt);
     if (err == 0) err = read_stream_format(ctx, open_param);

@@ -1,7 +1,7 @@
 // Stage 2a: plans the decoding.
 //
-// In: a path, or a start in the stream. Out: the segments, each with an open source and a buffer,
-// and a zeroed buffer for the whole. Before: media_source/mtsrc.h. After: pcm/decode.h.
+// Input: a path, or a start in the stream. Output: the segments, each with an open source and a
+// buffer, and one zeroed PCM buffer. Follows media_source/mtsrc.h; precedes pcm/decode.h.
 //
 // The stream is cut into 1 or 4 segments, each with its own media source, buffer and thread. All
 // but the last decode two seconds past their end.
@@ -52,9 +52,9 @@ int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param);
 // condition. Accepts a partly built plan and may be called twice.
 void tavo_decode_deinit(TAVO_CTX *ctx);
 
-// Plans the decoding from start (100-ns units) to the end of the stream with the open sources, and
-// allocates new segment buffers and a new pcm. The caller must have freed the old ones. Returns 0;
-// TAVO_ERR_MEMORY if memory runs out or nothing is left to decode, with the segment buffers freed.
+// Plans the decoding from `start` (100-ns units) to the end of the stream with the open sources.
+// Allocates new segment buffers and a new pcm; the caller must have freed the old ones. Returns 0,
+// or TAVO_ERR_MEMORY with the segment buffers freed if memory runs out or nothing is left.
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
 }
 

@@ -39,8 +39,8 @@ offset_range search_range(int64_t expected, int32_t rate, int64_t pcm_bytes) {
     return {first, std::min(end, pcm_bytes - kBlockBytes + 1)};
 }
 
-// Finds in pcm the audio that the source delivers next. *off: its expected byte offset on entry,
-// the offset found on return. Returns 0 if found; -1 if not, with *off unchanged.
+// Finds in `pcm` the audio that the source delivers next. *off is its expected byte offset on entry
+// and the offset found on return. Returns 0 if found; -1 if not, with *off unchanged.
 int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_t pcm_bytes,
                         int64_t *off) {
     auto *probe = static_cast<uint8_t *>(malloc(kProbeBytes));
@@ -71,7 +71,7 @@ int64_t planned_bytes(const TAVO_DECSEG *seg) {
     return span_bytes(units, seg->fmt.sample_rate, &bytes) ? bytes : 0;
 }
 
-// Discards the decoded PCM and decodes the stream again from start (100-ns units).
+// Discards the decoded PCM and decodes the stream again from `start` (100-ns units).
 int32_t decode_again(TAVO_CTX *ctx, int64_t start, segment_pages pages) {
     for (int32_t i = 0; i < ctx->seg_count; ++i) {
         free(ctx->seg[i].buf);
@@ -86,14 +86,14 @@ int32_t decode_again(TAVO_CTX *ctx, int64_t start, segment_pages pages) {
     return 0;
 }
 
-// Seeks to pos (milliseconds) and stores the position reached as the highlight. Finds it in the
-// decoded PCM, or decodes again from there. *off: bytes of pcm before that position.
+// Seeks to `pos` (milliseconds) and stores the position reached as the highlight. Finds it in the
+// decoded PCM, or decodes again from there. *off: bytes of `pcm` before that position.
 int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t *off) {
     mtsrc_ctx *src = ctx->seg[0].src;
     const int32_t rate = ctx->fmt.sample_rate;
     int64_t reached = 0;
     if (__builtin_mul_overflow(pos, kUnitsPerMs, &reached)) reached = INT64_MAX;
-    // A seek that fails without reporting a position counts as having reached the one asked for.
+    // A seek that fails without reporting a position counts as having reached its target.
     mtsrc_seekstream(src, reached, &reached);
     ctx->hl->hl_pos = static_cast<uint32_t>(reached / kUnitsPerMs);
 
@@ -106,7 +106,7 @@ int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t 
     return decode_again(ctx, reached, pages);
 }
 
-// Converts pcm without its first off bytes and frees it.
+// Converts `pcm`, skipping its first `off` bytes, and frees it.
 int32_t convert_rest(TAVO_CTX *ctx, int64_t off) {
     int16_t *pcm = ctx->pcm;
     const int64_t bytes = pcm == nullptr ? 0 : std::max<int64_t>(ctx->pcm_bytes - off, 0);

@@ -1,9 +1,9 @@
 // Mode 2: computes the analysis signal from the highlight on.
 //
-// In: TAVO_CTX.pcm and a start in milliseconds. Out: ana, ana_len, and hl.hl_pos, the start that
-// was used; pcm is always released. The PCM is cut at the position that a seek to the start
+// Input: TAVO_CTX.pcm and a start in milliseconds. Output: ana, ana_len, and hl.hl_pos, the start
+// that was used; pcm is always released. The PCM is cut at the position that a seek to the start
 // reaches. If that position cannot be found in the PCM, the stream is decoded again from there.
-// Before: highlight/position.h. After: beat/beats.h.
+// Follows highlight/position.h; precedes beat/beats.h.
 #ifndef TAVO_PCM_FROM_HIGHLIGHT_H
 #define TAVO_PCM_FROM_HIGHLIGHT_H
 
@@ -16,10 +16,10 @@ extern "C" {
 // all of them.
 int32_t tavo_get_from_here(TAVO_CTX *ctx, int64_t pos);
 
-// Finds in pcm the audio that the segment's source delivers next. *off: its expected byte offset on
-// entry, the offset found on return. Reads src, fmt, start and duration of the record; the last two
-// determine the size of pcm, which is not checked if duration is 0. Returns 0 if found; -1 if not,
-// with *off unchanged.
+// Finds in `pcm` the audio that the segment's source delivers next. *off is its expected byte
+// offset on entry and the offset found on return. Reads src, fmt, start and duration of the record;
+// the last two determine the size of pcm, which is not checked if duration is 0. Returns 0 if
+// found; -1 if not, with *off unchanged.
 int32_t _compare_decoded(TAVO_DECSEG *seg, const int16_t *pcm, int64_t *off);
 }
 

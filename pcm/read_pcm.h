@@ -1,7 +1,7 @@
 // Reads a media source until a buffer is full.
 //
-// In: a positioned source. Out: 16-bit mono PCM, bytes. Called by pcm/decode.cpp for a segment and
-// by pcm/from_highlight.cpp for the probe at a highlight.
+// Input: a positioned source. Output: 16-bit mono PCM, bytes. Called by pcm/decode.cpp for a
+// segment and by pcm/from_highlight.cpp for the probe at a highlight.
 #ifndef TAVO_PCM_READ_PCM_H
 #define TAVO_PCM_READ_PCM_H
 

@@ -11,7 +11,7 @@ namespace {
 
 constexpr int64_t kTailBytes = 64;  // zero bytes after the last output
 
-// One conversion of count samples at source_rate to n samples at ana_rate.
+// One conversion of `count` samples at source_rate to `n` samples at ana_rate.
 struct conversion {
     int64_t count;
     int64_t n;
@@ -48,8 +48,8 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
     if (ready) {
         advise_huge_pages(narrow, plan.n * kBytesPerSample);
         if (dorn_resampler_prepare(state, plan.source_rate, plan.ana_rate, 1) == 0) {
-            // The converter counts its input in 32 bits. What is past them, 12 hours at 48 kHz,
-            // stays 0.
+            // The converter counts its input in 32 bits. The output for later input
+            // (after 12 hours at 48 kHz) stays 0.
             const auto in_len = static_cast<int32_t>(std::min<int64_t>(plan.count, INT32_MAX));
             convert_frames(state, in, in_len, narrow, plan.n);
         }

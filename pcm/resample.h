@@ -1,7 +1,7 @@
 // Stage 3: converts source-rate PCM to the analysis signal.
 //
-// In: 16-bit mono PCM at the stream's rate. Out: doubles on the 16-bit scale at the analysis rate.
-// Before: pcm/decode.h. After: beat/beats.h.
+// Input: 16-bit mono PCM at the stream's rate. Output: doubles on the 16-bit scale at the analysis
+// rate. Follows pcm/decode.h; precedes beat/beats.h.
 #ifndef TAVO_PCM_RESAMPLE_H
 #define TAVO_PCM_RESAMPLE_H
 

@@ -15,13 +15,13 @@ namespace {
 constexpr int32_t kParts = 4;
 constexpr int32_t kExactFloats = 1 << 24;  // floats represent whole numbers exactly up to here
 
-// Number of outputs whose block has exactly whole samples. Later positions are rounded in single
+// Number of outputs whose block has exactly `whole` samples. Later positions are rounded in single
 // precision.
 int64_t exact_blocks(int32_t whole) {
     return whole == 3 ? kExactFloats / 3 : kExactFloats;
 }
 
-// First input sample of output i, at most count. Single precision on purpose: its rounding
+// First input sample of output i, at most `count`. Single precision on purpose: its rounding
 // determines the blocks of long signals.
 int64_t block_start(float ratio, int64_t i, int64_t count) {
     const float position = ratio * static_cast<float>(i);
@@ -35,8 +35,8 @@ double block_mean(const int16_t *in, int64_t first, int64_t end) {
     return static_cast<double>(sum / static_cast<float>(end - first));
 }
 
-// Averages blocks of any length for the outputs first to end - 1. in[0] is sample base of the count
-// samples.
+// Averages blocks of any length for outputs `first` to `end` - 1. in[0] is sample number `base` of
+// the `count` samples.
 void average_blocks(float ratio, const int16_t *in, int64_t base, int64_t count, double *out,
                     int64_t first, int64_t end) {
     for (int64_t i = first; i < end; ++i) {
@@ -92,7 +92,7 @@ void average_part(void *record) {
     const auto *part = static_cast<RESAMPLE_PART *>(record);
     if (part->in_count < 1) return;
     const int32_t whole = whole_ratio(part->ratio);
-    int64_t exact = part->first;  // end of the outputs whose blocks have exactly whole samples
+    int64_t exact = part->first;  // end of the outputs whose blocks have exactly `whole` samples
     if (whole > 0 && part->first >= 0) {
         exact = std::min({part->end, exact_blocks(whole), part->in_count / whole});
         exact = std::max(exact, part->first);
@@ -104,7 +104,7 @@ void average_part(void *record) {
     average_blocks(part->ratio, part->in, 0, part->in_count, part->out, exact, part->end);
 }
 
-// Computes the outputs from exact_blocks(4) to n at ratio 4 in place. The samples of a block may be
+// Computes outputs exact_blocks(4) to n - 1 at ratio 4 in place. The samples of a block may be
 // overwritten by an earlier output, so they are read ahead.
 void average_rounded_in_place(const int16_t *in, int64_t count, double *out, int64_t n) {
     // Outputs per step. The position of a step's first output is exact in songs of up to 72 days,

@@ -1,6 +1,6 @@
 // Stage 3 for the ratios 1, 2, 3 and 4: averages blocks of samples on four threads.
 //
-// In: 16-bit mono PCM. Out: doubles on the 16-bit scale. Called by pcm/resample.cpp.
+// Input: 16-bit mono PCM. Output: doubles on the 16-bit scale. Called by pcm/resample.cpp.
 #ifndef TAVO_PCM_RESAMPLE_BLOCK_H
 #define TAVO_PCM_RESAMPLE_BLOCK_H
 

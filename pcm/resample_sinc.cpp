@@ -13,7 +13,7 @@ constexpr int32_t kTapsOther = 19;
 constexpr double kWholeRatio = 0.0001;
 constexpr double kEdgeDown = 0.9;        // cut-off relative to the output's Nyquist frequency
 constexpr double kEdgeUp = 0.99;         // upper limit relative to the input's Nyquist frequency
-constexpr double kCentre = 1e-9;         // closer to its centre the sinc is replaced by its limit
+constexpr double kCentre = 1e-9;         // any closer to its centre, the sinc is set to its limit
 constexpr double kPhaseSteps = 960.0;    // phases per input sample
 constexpr double kMiddlePhase = 480.0;   // the phase with no fractional offset
 constexpr double kFracLimit = 0.500001;  // half a sample plus rounding
@@ -36,7 +36,7 @@ float tap_coefficient(int32_t taps, int32_t k, float f, float wc) {
     return static_cast<float>(sinc * static_cast<double>(w));
 }
 
-// Input of one output frame: input frames first to first + taps, weighted by row.
+// Input of one output frame: input frames `first` to `first` + taps, weighted by `row`.
 struct frame_input {
     int64_t first;
     const float *row;
@@ -100,7 +100,7 @@ int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int
     status found = status::inside;
     int64_t j = 0;
     while (j < max_frames) {
-        // Near the ends, and with several channels, output frames are computed one by one.
+        // Near the ends, and with several channels, output frames are computed one at a time.
         if (channels == 1 && j + kQuad <= max_frames &&
             filter_quad(*state, j, in, in_len, out + j)) {
             j += kQuad;

@@ -1,6 +1,6 @@
 // Stage 3 for all other ratios: a windowed-sinc interpolator with 961 phases.
 //
-// In: 16-bit PCM, interleaved. Out: 16-bit PCM at the target rate. Called by pcm/resample.cpp.
+// Input: interleaved 16-bit PCM. Output: the same at the target rate. Called by pcm/resample.cpp.
 #ifndef TAVO_PCM_RESAMPLE_SINC_H
 #define TAVO_PCM_RESAMPLE_SINC_H
 
@@ -21,13 +21,13 @@ static_assert(offsetof(dorn_resampler_state, coef) == 12);
 
 extern "C" {
 
-// Fills a zeroed state. Returns 0; -1 if the target rate is not positive or the source rate is 0.
+// Fills a zeroed state. Returns 0, or -1 if the target rate is below 1 or the source rate is 0.
 // With a negative source rate it fills a table that the conversion rejects.
 int32_t dorn_resampler_prepare(dorn_resampler_state *state, int32_t source_rate,
                                int32_t target_rate, int32_t channels);
 
-// Converts in_len samples of all channels together. Returns the samples written to out, 0 if the
-// input is too short for one; -1 if an argument is missing or a phase is out of range.
+// Converts in_len samples, counted over all channels. Returns the samples written to out (0 if the
+// input is too short for one), or -1 if an argument is missing or a phase is out of range.
 int32_t dorn_resampler_convert(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
                                int16_t *out);
 }
@@ -37,7 +37,7 @@ int32_t dorn_resampler_convert(const dorn_resampler_state *state, const int16_t 
 int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
                        int16_t *out, int64_t max_frames);
 
-// The sum rounded to the nearest integer, halves up, in its low 16 bits.
+// Rounds the sum to the nearest integer, halves up, and returns its low 16 bits.
 int16_t wrap_sample(float sum);
 
 #endif

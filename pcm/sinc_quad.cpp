@@ -72,9 +72,9 @@ float_quad sum_quad(int32_t taps, const float *const *row, const int16_t *const 
     return acc;
 }
 
-// Finds the first input sample and the phase of the output frames from j on, as find_input does for
-// one. Returns false if an output frame needs samples outside the input or its phase may be out of
-// range.
+// Finds the first input sample and the phase of output frames j to j + 3, as find_input does for
+// one frame. Returns false if an output frame needs samples outside the input or its phase may be
+// out of range.
 bool find_inputs(const dorn_resampler_state &state, int64_t j, int32_t in_len, int_quad *first,
                  int_quad *phase) {
     const float last = state.ratio * static_cast<float>(j + kQuad - 1);

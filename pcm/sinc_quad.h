@@ -1,6 +1,6 @@
 // Windowed-sinc interpolation of four output frames at once, bit-identical to one frame at a time.
 //
-// In: 16-bit mono PCM. Out: 16-bit mono PCM. Called by pcm/resample_sinc.cpp.
+// Input: 16-bit mono PCM. Output: 16-bit mono PCM. Called by pcm/resample_sinc.cpp.
 #ifndef TAVO_PCM_SINC_QUAD_H
 #define TAVO_PCM_SINC_QUAD_H
 

@@ -1,7 +1,7 @@
 // Joins the decoded segments into one signal.
 //
-// In: segments with their buffers, 16-bit mono PCM. Out: one buffer of PCM. Called by
-// pcm/decode.cpp. After: highlight/position.h, pcm/resample.h.
+// Input: segments with their buffers, 16-bit mono PCM. Output: one buffer of PCM. Called by
+// pcm/decode.cpp. Precedes highlight/position.h and pcm/resample.h.
 #ifndef TAVO_PCM_STITCH_H
 #define TAVO_PCM_STITCH_H
 
@@ -25,9 +25,9 @@ inline int64_t second_bytes(int32_t rate) {
     return rate * kBytesPerSample;
 }
 
-// Copies the count decoded segments to dst (capacity bytes). Each is placed where the output
-// already has the same bytes, or at the end of the output. Returns the bytes written; 0 if any
-// segment is empty.
+// Copies the `count` decoded segments to dst (capacity bytes). Each is placed where the output
+// already has the same bytes, or at the end of the output. Returns the number of bytes written; 0
+// if any segment is empty.
 int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
                         int64_t capacity, segment_pages pages);
 

@@ -29,7 +29,7 @@ class _Param(ctypes.Structure):  # TAVO_PARAM of tavo.h
 
 
 _Callback = ctypes.CFUNCTYPE(None, ctypes.POINTER(_Info))
-_one_instance = threading.Lock()  # the library has one instance in a process
+_one_instance = threading.Lock()  # the library allows one instance per process
 _loaded: Optional[ctypes.CDLL] = None
 
 

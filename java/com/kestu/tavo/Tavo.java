@@ -18,15 +18,15 @@ import java.lang.ref.WeakReference;
  *
  * <p><b>Order.</b> {@code init}, {@code analyze} once, the event once, {@code deinit}; then
  * {@code init} again for the next file. {@code deinit} is allowed at any time after {@code init}.
- * It stops a running job, whose event still comes before {@code deinit} returns.
+ * It stops a running job, whose event still arrives before {@code deinit} returns.
  *
  * <p><b>Threads.</b> Call {@code init}, {@code analyze} and {@code deinit} from one thread, or from
  * several that take turns. {@code init} reads from the file and {@code deinit} waits for a running
- * job, so do not call them on a user-interface thread. Events come on a thread of the library.
+ * job, so do not call them on a user-interface thread. Events arrive on a thread of the library.
  *
  * <p><b>Lifetime.</b> The library holds this object by a weak reference. Keep your own reference
  * until the event has arrived, or the event is lost. Only {@code deinit} releases the native
- * analysis; if an object is lost before its {@code deinit}, the next object's releases it.
+ * analysis; if an object is lost before its {@code deinit}, the next object's does.
  *
  * <p><b>Click track.</b> The modes with beats write a diagnostic WAV file into the working
  * directory unless {@link #disableClickTrack} was called. On Android the working directory is not
