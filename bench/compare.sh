@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # bench/compare.sh [-n PAIRS] [-m MODE] FILE...
-# Compares a whole analysis of each file with decoding the same file by ffmpeg. Runs them alternately in pairs and
+# Compares a whole analysis of each file with decoding the same file with ffmpeg. Runs them alternately in pairs and
 # prints a Markdown table of the medians of wall time, processor time and peak memory, and the median ratios of the
 # pairs. Uses build/release/bin/tavo, or the command that TAVO names. Close other programs
 # first; on a busy machine, rely on the ratios of processor time only.

@@ -28,7 +28,7 @@ constexpr int32_t kMostBeats = 1'000'000'000;
 constexpr size_t kOptionColumns = 28;  // width of the names in --help
 constexpr size_t kTextColumns = 80 - kOptionColumns;
 
-// Ordered as result_format.
+// In the order of result_format.
 const std::vector<std::string> kFormats = {"text", "json", "csv"};
 
 std::vector<std::string> format_words() {
@@ -61,11 +61,11 @@ int wrong_usage(const std::string &sentence) {
     return kExitUsage;
 }
 
-// The parser splits a value in square brackets at its commas. For file names shield prevents this
-// by a byte before the bracket, and unshield removes it.
+// The parser splits a value in square brackets at its commas. For file names `shielded` prevents
+// this with a byte before the bracket, which `unshield` removes.
 constexpr char kShield = '\x01';
 
-// The arguments in the order that the parser requires, last to first.
+// Returns the arguments in the order that the parser requires, last to first.
 std::vector<std::string> shielded(int argc, char **argv) {
     std::vector<std::string> out;
     for (int i = argc - 1; i > 0; --i) {
@@ -351,7 +351,7 @@ std::optional<int> parse_options(int argc, char **argv, options &out) {
     declare_all(app, out);
     try {
         app.parse(shielded(argc, argv));
-    } catch (const CLI::ParseError &end) {  // or help or the version
+    } catch (const CLI::ParseError &end) {  // also thrown for help and the version
         if (end.get_exit_code() != 0) return wrong_usage(end.what());
         if (end.get_name() == "CallForHelp") {
             std::cout << kUsage << kAbout << "\n\n" << kExamples << "\n" << kOptionNames;

@@ -14,8 +14,8 @@ enum class result_format {
     text,
     json,
     csv,
-    markers,  // a file for each input, of the kind options.markers
-    // without a word for --format
+    markers,  // one file per input, in the format options.markers
+    // The next two have no word for --format.
     print,  // --print
     none,   // no output, because the store has the results
 };

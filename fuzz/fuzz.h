@@ -25,8 +25,8 @@ inline void must(bool condition, const char *promise) {
     abort();
 }
 
-// Reads at most count values on one of three scales: small whole numbers, often equal; 0 to 1; any
-// bits, including infinities and NaN.
+// Reads at most `count` values on one of three scales: small whole numbers, often equal; 0 to 1;
+// any bits, including infinities and NaN.
 template <typename T>
 std::vector<T> values(input *in, size_t count) {
     const int scale = in->ConsumeIntegralInRange(0, 2);
@@ -39,7 +39,7 @@ std::vector<T> values(input *in, size_t count) {
     return list;
 }
 
-// Reads count values and fills the missing ones with zeros.
+// Reads `count` values and fills the missing ones with zeros.
 template <typename T>
 std::vector<T> padded_values(input *in, size_t count) {
     std::vector<T> list = values<T>(in, count);

@@ -24,7 +24,7 @@ int64_t bytes_at(const stream &source, int64_t units) {
     return 2 * (units / kUnitsPerSecond * rate + units % kUnitsPerSecond * rate / kUnitsPerSecond);
 }
 
-// Reads want bytes and appends the delivered ones to out.
+// Requests `want` bytes and appends the delivered ones to `out`.
 int32_t read(stream *source, int32_t want, std::vector<uint8_t> *out) {
     std::vector<uint8_t> buffer(static_cast<size_t>(std::clamp(want, 1, kBuffer)));
     mtsrc_frame frame = {buffer.data(), kNeverWritten};

@@ -119,7 +119,7 @@ void convert(fuzz::input *in) {
 
 // --- 7: the highlight
 
-// Returns count ascending positions below n. The list has at least capacity entries.
+// Returns `count` ascending positions below `n`. The list has at least `capacity` entries.
 std::vector<int32_t> choose_positions(fuzz::input *in, size_t count, size_t capacity, int32_t n) {
     std::vector<int32_t> list(count);
     for (int32_t &at : list) at = in->ConsumeIntegralInRange(0, n - 1);

@@ -18,7 +18,7 @@ struct signal {
     std::vector<double> re, im;
 };
 
-// The term k of a discrete Fourier transform of the first count values of x. sign: -1 for the
+// Term `k` of the discrete Fourier transform of the first `count` values of `x`. sign: -1 for the
 // forward transform, 1 for the inverse, which divides by n.
 std::complex<double> sum_at(const signal &x, int count, int k, int sign) {
     const auto n = static_cast<int>(x.re.size());
@@ -31,7 +31,7 @@ std::complex<double> sum_at(const signal &x, int count, int k, int sign) {
     return sign < 0 ? sum : sum / static_cast<double>(n);
 }
 
-// Checks that the first outputs values of y are the transform of the first inputs values of x.
+// Checks that the first `outputs` values of y transform the first `inputs` values of x.
 void check_sums(const signal &y, int outputs, const signal &x, int inputs, int sign) {
     double norm = 0.0;
     for (size_t i = 0; i < x.re.size(); ++i) norm += std::fabs(x.re[i]) + std::fabs(x.im[i]);
@@ -87,9 +87,9 @@ std::vector<int64_t> peaks_of(const std::vector<T> &x) {
     return peaks;
 }
 
-// Checks that out starts with the expected positions. Then come the peaks, largest first, except
-// those within radius of an earlier position; out has at most max_count entries. Equal peaks may be
-// in any order.
+// Checks that `out` starts with the expected positions. Then come the peaks, largest first, except
+// those within `radius` of an earlier position; `out` has at most max_count entries. Equal peaks
+// may be in any order.
 template <typename T, typename Index>
 void check_peaks(const std::vector<T> &x, const std::vector<Index> &out,
                  std::vector<int64_t> expected, int64_t radius, size_t max_count = SIZE_MAX) {

@@ -7,7 +7,7 @@ cd "$(dirname "$0")/.."
 root=$PWD/build/aarch64-sysroot
 packages='libc6-dev libstdc++-12-dev libavcodec-dev libavutil-dev libflac-dev libogg-dev libgtest-dev
   libbenchmark-dev nlohmann-json3-dev'
-headers='android-libnativehelper-dev:amd64 android-liblog-dev:amd64' # built for amd64 alone
+headers='android-libnativehelper-dev:amd64 android-liblog-dev:amd64' # only built for amd64
 [ -e "$root/.complete" ] && [ "$(cat "$root/.complete")" = "$packages $headers" ] && exit 0
 
 apt=$PWD/build/aarch64-apt

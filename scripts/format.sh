@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # scripts/format.sh [--check]
-# Formats all C and C++ sources by .clang-format. --check only reports what would change.
+# Formats all C and C++ sources according to .clang-format. --check only reports what would change.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 case ${1:-} in

@@ -81,7 +81,7 @@ END
   exit 1
 }
 
-make_songs() { # 120 songs of 20 to 45 s in three formats, and a text
+make_songs() { # 120 songs of 20 to 45 s in three formats, and a text file
   mkdir "$dir/songs"
   "$bin/make_song" "$dir/song.wav" --seconds 60 --loud-at 20
   local i

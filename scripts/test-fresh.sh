@@ -41,7 +41,7 @@ urandom 1 9
 tty 5 0
 END
 ln -s /proc/self/fd "$root/dev/fd"
-echo "127.0.0.1 localhost" >"$root/etc/hosts" # which the installer of a machine writes
+echo "127.0.0.1 localhost" >"$root/etc/hosts" # usually written by the installer
 
 git clone --quiet --no-hardlinks . "$root/root/tavo"
 git -C "$root/root/tavo" checkout --quiet --detach "$(git rev-parse HEAD)"

@@ -15,7 +15,7 @@ bash scripts/setup.sh build java tests package
 build=$PWD/build/package
 rm -rf "$build"
 debs=$build/first
-for copy in first second; do # of the last commit
+for copy in first second; do # copies of the last commit
   mkdir -p "$build/$copy/tavo"
   git archive HEAD | tar -x -C "$build/$copy/tavo"
   (cd "$build/$copy/tavo" && dpkg-buildpackage -b -us -uc >"$build/$copy.log" 2>&1) ||
@@ -40,7 +40,7 @@ quietly() {
 }
 echo "== a clean system"
 quietly debootstrap --variant=minbase bookworm "$root"
-mount -t proc proc "$root/proc" # where the loader finds the path of a program
+mount -t proc proc "$root/proc" # the loader finds the path of a program there
 inside() {
   env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin LC_ALL=C.UTF-8 DEBIAN_FRONTEND=noninteractive \
     chroot "$root" "$@"

@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # scripts/tidy.sh [FILE]...
-# Checks the product's sources, or the FILEs, by .clang-tidy. Needs a configured build/release.
+# Checks the product's sources, or the FILEs, according to .clang-tidy. Needs a configured build/release.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $# -eq 0 ]]; then

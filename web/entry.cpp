@@ -58,8 +58,8 @@ void analyse_song(record &result, int32_t max_beats) {
 
 }  // namespace
 
-// Analyses the WAV file at path. channels: of the song before the downmix. Returns JSON: "song" for
-// song.js and "result" in the form of --format json; without "song" if the analysis failed.
+// Analyses the WAV file at `path`. channels: of the song before the downmix. Returns JSON: "song"
+// for song.js and "result" in the form of --format json; without "song" if the analysis failed.
 extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, int32_t max_beats,
                              int32_t channels) {
     fnamedec = "";

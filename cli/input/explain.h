@@ -9,11 +9,11 @@
 #include "cli/failure.h"
 #include "cli/run/record.h"
 
-// Checks that the file at path is a readable regular file of sufficient size. Never blocks,
+// Checks that the file at `path` is a readable regular file of sufficient size. Never blocks,
 // whatever kind of file it is.
 failure check_file(const std::string &path);
 
-// Returns the reason for a failure of tavo_init with code. path: as passed to the library. Stores
+// Returns the reason why tavo_init failed with `code`. path: as passed to the library. Stores
 // the known properties of the stream in result.
 failure explain_refusal(const std::string &path, int32_t code, record &result);
 

@@ -10,7 +10,7 @@
 #include "cli/failure.h"
 #include "cli/options.h"
 
-// Decodes the first audio stream of path, or of fd unless it is negative. sound_fd receives a new
+// Decodes the first audio stream of `fd`, or of `path` if `fd` is negative. sound_fd receives a new
 // descriptor, which the caller closes; -1 after a failure.
 failure decode_with_ffmpeg(const options &opts, const std::string &path, int fd,
                            const std::string &filter, int stop_fd, int &sound_fd);

@@ -29,9 +29,9 @@ constexpr size_t kMostMessageBytes = 65536;  // only the first line is used
 // Limit of the address space. A damaged file can make ffmpeg allocate hours of silence at once.
 constexpr rlim_t kMostProgramBytes = rlim_t{448} << 20;
 constexpr int kReadPollMs = 1000;  // between two checks of the clock
-constexpr int kEndPollMs = 10;     // between two checks whether the program has ended
+constexpr int kEndPollMs = 10;     // between two checks for the end of the program
 
-// Containers that contain their sound. Playlists and scripts (HLS, concat, DASH, SDP, image
+// Containers that hold their own audio. Playlists and scripts (HLS, concat, DASH, SDP, image
 // sequences) refer to other files and are not accepted.
 constexpr const char *kContainers =
     "aac,ac3,aiff,amr,amrnb,amrwb,ape,asf,au,avi,caf,dsf,dts,dtshd,eac3,flac,flv,iff,loas,matroska,"

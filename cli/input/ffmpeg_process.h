@@ -1,4 +1,4 @@
-// Runs the ffmpeg program on one file, which may come from anywhere.
+// Runs the ffmpeg program on one file, which is not trusted.
 //
 // In: a file and the arguments for the output. Out: the bytes of its standard output. Called by
 // ffmpeg.h and write/clip.h in a worker process.

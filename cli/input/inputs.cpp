@@ -74,7 +74,7 @@ failure enter_folder(input_supply &supply, const std::string &path, const struct
         entries.push_back(entry->path());
     }
     if (code) return {system_sentence("The folder cannot be read", code.value())};
-    std::sort(entries.begin(), entries.end(), std::greater<>());  // by bytes
+    std::sort(entries.begin(), entries.end(), std::greater<>());  // in byte order
     std::move(entries.begin(), entries.end(), std::back_inserter(supply.entries));
     return {};
 }
@@ -95,7 +95,7 @@ bool leave_folder(input_supply &supply, input &out) {
     return false;
 }
 
-// True if the file must be analysed or reported. code receives errno if it cannot be read.
+// True if the file must be analysed or reported. `refusal` is set if it cannot be read.
 bool is_audio(const std::string &path, const options &opts, failure &refusal) {
     file_kind kind = file_kind::unknown;
     if (const int code = recognise(path, kind)) {

@@ -18,16 +18,16 @@
 
 struct input {
     std::string path;  // any bytes except NUL
-    failure refusal;   // if the input is already known to be unusable
+    failure refusal;   // set if the input is already known to be unusable
 };
 
 using file_id = std::pair<dev_t, ino_t>;
 
 struct input_supply {
     const options &opts;
-    size_t argument = 0;                    // next of opts.inputs, then of opts.lists
-    list_reader list = {};                  // being read
-    std::string folder = {};                // being searched, or empty
+    size_t argument = 0;                    // next index in opts.inputs, then in opts.lists
+    list_reader list = {};                  // list that is being read
+    std::string folder = {};                // folder that is being searched, or empty
     std::vector<std::string> entries = {};  // of folder, not yet examined, in reverse order
     std::set<file_id> searched = {};        // folder and the folders entered in it
     size_t found = 0;                       // audio files in it

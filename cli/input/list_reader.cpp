@@ -29,7 +29,7 @@ failure read_more(list_reader &list) {
     return {};
 }
 
-// A song that is passed as a list by mistake would give thousands of names.
+// Refuses a song that is passed as a list by mistake: it would give thousands of names.
 failure check_start(const list_reader &list) {
     const file_kind kind = recognise_bytes(list.text);
     if (kind != file_kind::unknown) {
@@ -48,7 +48,7 @@ bool is_comment(const std::string &line) {
     return line[0] == '#' && lstat(line.c_str(), &info) != 0;
 }
 
-// Removes the next line from the text and returns it. Returns none if its separator has not
+// Removes the next line from the text and returns it. Returns nothing if its separator has not
 // arrived, unless the list has ended.
 std::optional<std::string> read_line(list_reader &list) {
     const size_t end = list.text.find(list.separator);

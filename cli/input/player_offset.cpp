@@ -10,7 +10,7 @@
 
 namespace {
 
-constexpr int64_t kDecoderDelay = 529;  // samples, of every Layer III decoder
+constexpr int64_t kDecoderDelay = 529;  // samples, in every Layer III decoder
 constexpr int32_t kDropRate = 44'100;   // Hz; at this rate the library drops that delay in stereo
 constexpr int64_t kLayer1Samples = 384;
 
@@ -98,7 +98,7 @@ std::string read_movie(const std::string &path) {
     return "";
 }
 
-// Units per second of an mvhd or mdhd box.
+// Returns the time scale of an mvhd or mdhd box in units per second.
 double time_scale(std::string_view header) {
     const bool is_long = big_endian(header, 0, 1) == 1;
     return std::max(static_cast<double>(big_endian(header, is_long ? 20 : 12, 4)), 1.0);
@@ -124,7 +124,7 @@ bool read_edits(std::string_view list, double movie_scale, double media_scale, d
     return false;
 }
 
-// "iTunSMPB": the encoder's delay in samples as the second of its hexadecimal numbers.
+// Reads the encoder's delay from "iTunSMPB": the second hexadecimal number, in samples.
 double tag_offset_ms(const std::string &movie, int32_t rate) {
     const size_t name = movie.find("iTunSMPB");
     const size_t data = name == std::string::npos ? name : movie.find("data", name);

@@ -27,7 +27,7 @@ constexpr signature kSignatures[] = {
     {file_kind::matroska, "\x1A\x45\xDF\xA3"},
 };
 
-// Ordered as file_kind.
+// In the order of file_kind.
 constexpr const char *kNames[] = {
     "unknown",         "WAV", "AIFF", "FLAC", "Ogg", "MP4", "AAC", "MP3", "ASF (Windows Media)",
     "Matroska or WebM"};

@@ -29,9 +29,9 @@ bool needs_ffmpeg(const song_file &song);
 // unchanged.
 failure decode_song(const std::string &path, const options &opts, int stop_fd, song_file &song);
 
-// Decodes the song at path again with ffmpeg, into raised: the channel that the library analyses,
-// from offset_ms before the player's time 0 on, with each sample multiplied by gain and clipped.
-// song: the same song, opened before. After a failure there is nothing to close.
+// Decodes the song at `path` again with ffmpeg into `raised`: the channel that the library
+// analyses, starting offset_ms before the player's time 0, with each sample multiplied by `gain`
+// and clipped. song: the same song, opened before. After a failure there is nothing to close.
 failure raise_song(const std::string &path, const options &opts, int stop_fd, const song_file &song,
                    double gain, double offset_ms, song_file &raised);
 

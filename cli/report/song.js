@@ -1,4 +1,4 @@
-// Draws one song's result on one time axis, in ms of the player, and plays the song.
+// Draws one song's result on one time axis, in ms of the player's time, and plays the song.
 const song = JSON.parse(document.getElementById("data").textContent);
 const beats = song.beats_ms || [];
 const hasHighlight = song.hl_pos_ms !== undefined;

@@ -44,8 +44,8 @@ extent merged(const extent &a, const extent &b) {
     return {std::min(a.low, b.low), std::max(a.high, b.high)};
 }
 
-// Doubles the length of the bins when there are too many. Their number is not known before, because
-// the duration stated by a file may be wrong.
+// Doubles the length of the bins when there are too many. Their number is not known in advance,
+// because the duration stated by a file may be wrong.
 void close_bin(sound &song) {
     song.bins.push_back(song.bin);
     song.bin = {};

@@ -23,7 +23,7 @@ struct run_state {
     const options &opts;
     input_supply supply{opts};
     process_pool pool{opts};
-    supply_state found = supply_state::ready;  // by the last search
+    supply_state found = supply_state::ready;  // result of the last search
     std::deque<job> queue = {};
     size_t count = 0;  // inputs found so far
     ordered_output output = {};
@@ -115,7 +115,7 @@ void send_jobs(run_state &state) {
     }
 }
 
-// Time that poll may wait: the shortest of the given times, where -1 means no limit.
+// Returns how long poll may wait: until the earliest of the timeouts. -1 means no limit.
 int wait_ms(const run_state &state) {
     int shortest = state.output.bar.shown ? kRedrawMs : -1;
     for (const int wait : {batch_timeout_ms(state.db), deadline_timeout_ms(state.pool)}) {

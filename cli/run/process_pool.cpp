@@ -23,8 +23,8 @@ using std::chrono::steady_clock;
 
 constexpr milliseconds kStopPatience{1000};
 
-// Runs in the new process. It closes the sockets of the other workers, because a closed socket is a
-// signal.
+// Runs in the new process. It closes the sockets of the other workers, because a copy left open
+// would hide the end of the command from them.
 [[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_files *files, int fd) {
     for (worker_process &other : pool.processes) close_fd(other.fd);
     ignore_stop_signals();
@@ -77,7 +77,7 @@ void finish_job(process_pool &pool, worker_process &worker, reply &&answer) {
     pool.on_reply(std::move(worker.current), std::move(answer));
 }
 
-// The worker has closed its socket.
+// Called when the worker has closed its socket.
 void reap(process_pool &pool, worker_process &worker) {
     close_fd(worker.fd);
     int status = 0;

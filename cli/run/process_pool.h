@@ -63,7 +63,7 @@ bool has_busy(const process_pool &pool);
 // ended after one second. Call it once; no job may be sent afterwards.
 void end_workers(process_pool &pool, bool is_stop);
 
-// For poll: appends one entry for each worker, in their order.
+// Appends one entry for poll for each worker, in the order of the workers.
 void append_watched(const process_pool &pool, std::vector<pollfd> &watched);
 int deadline_timeout_ms(const process_pool &pool);  // -1 if there is no deadline
 

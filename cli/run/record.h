@@ -23,7 +23,7 @@ struct record {
     int32_t sample_rate = 0;  // Hz
     int32_t channels = 0;     // of the decoder's output
     int64_t duration_ms = 0;
-    double offset_ms = 0.0;  // how much later times are here than in a player, see player_offset.h
+    double offset_ms = 0.0;  // time in this record minus time in a player, see player_offset.h
 
     bool has_highlight = false;
     int32_t hl_pos_ms = 0;

@@ -40,7 +40,7 @@ bool has_empty_log(const std::string &location) {
     return stat((location + "-wal").c_str(), &info) != 0 || info.st_size == 0;
 }
 
-// SQLite's codes if it cannot create the log: the second one if its user may not write there.
+// True if SQLite cannot create the log: the second code means that its user may not write there.
 bool lacks_log(int code) {
     return (code & 0xFF) == SQLITE_CANTOPEN || (code & 0xFF) == SQLITE_READONLY;
 }

@@ -14,7 +14,7 @@ namespace {
 
 constexpr const char *kBitRate = "192k";  // of lossy encodings
 
-// Chooses the kind of a clip by the kind of its input. A clip in ADTS, MPEG Layer II, AC-3, Windows
+// Chooses a clip's format from that of its input. A clip in ADTS, MPEG Layer II, AC-3, Windows
 // Media, Matroska or WebM would start late, because ffmpeg states no encoder delay there.
 struct audio_ending {
     const char *input;
@@ -54,7 +54,7 @@ std::string cut_filter(const record &result, const options &opts) {
     return filter;
 }
 
-// Reports its progress on standard output, so that run_ffmpeg sees it work.
+// Makes ffmpeg report its progress on standard output, so that run_ffmpeg sees that it works.
 std::vector<std::string> clip_output(const std::string &filter, const std::string &path) {
     return {"-map",   "0:a:0",     "-af",    filter, "-map_chapters", "-1", "-b:a",
             kBitRate, "-progress", "pipe:1", "-y",   "file:" + path};

@@ -34,7 +34,7 @@ int move_file(const std::string &from, const std::string &to, bool force) {
     if (force) return rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
     if (renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
     if (errno != EINVAL && errno != ENOSYS) return errno;
-    // On a file system without that operation, link fails too if the target exists.
+    // Where the file system lacks that operation, use link, which also fails if the target exists.
     if (link(from.c_str(), to.c_str()) != 0) return errno;
     unlink(from.c_str());
     return 0;

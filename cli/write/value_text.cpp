@@ -11,8 +11,8 @@
 
 namespace {
 
-constexpr const char *kModeWords[] = {"highlight", "beats", "both"};  // by TAVO_MODE_*
-constexpr const char *kStatusWords[] = {"ok", "failed", "stopped"};   // by outcome
+constexpr const char *kModeWords[] = {"highlight", "beats", "both"};  // indexed by TAVO_MODE_*
+constexpr const char *kStatusWords[] = {"ok", "failed", "stopped"};   // indexed by outcome
 
 std::string seconds_text(long long seconds) {
     const long long hours = seconds / 3600;

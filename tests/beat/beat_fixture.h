@@ -1,4 +1,4 @@
-// A beat analysis with a given signal, and signals for it.
+// Sets up a beat analysis of a given signal, and generates test signals.
 #ifndef TAVO_TESTS_BEAT_BEAT_FIXTURE_H
 #define TAVO_TESTS_BEAT_BEAT_FIXTURE_H
 
@@ -34,7 +34,7 @@ struct analysis {
     ~analysis() { clearOnsetCtx(ctx.onset); }
 };
 
-// The context of a silent signal of exactly that many analysis frames, with the lock and condition.
+// The context of a silent signal of a given number of analysis frames, with lock and condition.
 struct working_context {
     analysis signal;
     TAVO_BEAT_CTX beat = {};

@@ -49,8 +49,8 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 }  // namespace
 
-// Quiet noise, then loud noise. The onset between them is the one beat, although much sharper
-// onsets after silence follow.
+// Loud noise follows quiet noise. The onset between them is the only beat, although much sharper
+// onsets follow later, after silence.
 TEST(Beats, PowerRiseForcesABeat) {
     std::mt19937 random(9);
     std::vector<double> song(90 * 11025);
@@ -89,8 +89,8 @@ TEST(Beats, StopIsCheckedBeforeTheEnvelopeAndAfterTheTempo) {
     fault::disarm();
 }
 
-// Silence and signals too short for an envelope have 90 BPM and no beats. The file contains half of
-// the signal plus the blips with a gain of 1.25; 1001 and -1001 are halved toward zero.
+// Silence and signals too short for an envelope have 90 BPM and no beats. The file contains the
+// signal at half its level, rounded toward zero, plus the blips with a gain of 1.25.
 TEST(Beats, FileContainsHalfTheSignalAndTheBlips) {
     for (const size_t n : {0u, 1u, 511u, 512u, 767u, 11025u, 132300u}) {
         std::vector<double> signal(n, n < 768 ? 1001.0 : 0.0);
@@ -124,7 +124,7 @@ TEST(Beats, FileContainsHalfTheSignalAndTheBlips) {
     clearOnsetCtx(nullptr);
 }
 
-// i e^(-i/110) cos(2 pi 4000 i / 11025) / 160, at the sample nearest to 11025.44.
+// Sample i of a blip is i e^(-i/110) cos(2 pi 4000 i / 11025) / 160.
 TEST(ClickTrack, BlipIsADecayingTone) {
     const std::vector<float> track = track_of({1000.04f}, 20000);
     EXPECT_EQ(track[11025], 0.0f);
@@ -135,8 +135,8 @@ TEST(ClickTrack, BlipIsADecayingTone) {
     EXPECT_EQ(std::count(track.begin() + 11025 + kBlip, track.end(), 0.0f), 20000 - 11025 - 1102);
 }
 
-// 100 ms is 1102.5 samples, rounded to 1103; 150 ms is 1653.75. A blip that does not fit ends one
-// sample before the end. -0.1 ms is -1.1 samples, plus the half for rounding -0.6, truncated to 0.
+// A blip starts at the sample nearest to its beat, or at sample 0 if the beat is slightly negative.
+// A blip that does not fit ends one sample before the end of the track.
 TEST(ClickTrack, BlipsAreCutAtTheEnd) {
     struct part {
         size_t at, length;  // of the blip

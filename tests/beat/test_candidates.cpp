@@ -16,8 +16,8 @@ struct peak {
     double height;
 };
 
-// unselected: peaks followed by a plateau, which is not a peak. A peak with two larger values in
-// its window equals the 97th percentile, but it must exceed it.
+// Each peak in `unselected` is followed by a plateau, which is not a peak. The larger values of the
+// plateau keep the peak from exceeding the threshold, the 97th percentile of its window.
 struct envelope {
     int64_t length;
     int32_t bpm;
@@ -55,7 +55,7 @@ frames find_beats(const envelope &env) {
 
 }  // namespace
 
-// 120 BPM: beats are at least 43 frames apart, and larger peaks come first. -1 and 0 mean no limit.
+// Larger peaks come first, at least 43 frames apart at 120 BPM. max_beats -1 and 0 mean no limit.
 TEST(Candidates, LargerPeaksComeFirst) {
     EXPECT_EQ(find_beats({1, 90, {}}), frames{});
     EXPECT_EQ(find_beats({500, 0, {{100, 5}}}), frames{});
@@ -73,15 +73,15 @@ TEST(Candidates, LargerPeaksComeFirst) {
 }
 
 // At 40 BPM the window has 258 frames, more than a song of 257. The second half of the threshold
-// is then a line to the eighth largest value at the end. Frame 200 is at step 73 of 129.
+// then changes linearly to the eighth largest value at the end.
 TEST(Candidates, WindowThatNearlyFitsIsCut) {
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.6}}, {}, 0, 8}), frames{});
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
 }
 
-// At 96 BPM beats are two periods apart, 1.25 s. Up to 95 BPM they are at least 3 s apart: five
-// periods, 3.158 s. A gap is filled if it is longer than three spans, 129.2 frames at 120 BPM, or
-// at least 6 s, 258.4 frames, at 40 BPM.
+// At 96 BPM beats are at least two periods apart. Up to 95 BPM they are at least 3 s apart, in
+// whole periods. A gap is filled if it is longer than three of these distances (at 120 BPM) or at
+// least 6 s long (at 40 BPM).
 TEST(Candidates, SmallestDistanceAndLongGapDependOnTheTempo) {
     const std::tuple<int32_t, int64_t, int64_t, size_t> cases[] = {
         {96, 52, 0, 1},    {96, 53, 0, 2},    {95, 134, 0, 1},   {95, 135, 0, 2},
@@ -115,8 +115,8 @@ TEST(Candidates, LongGapsGetTheirStrongestPeaks) {
     EXPECT_EQ(find_beats(env), frames{800});
 }
 
-// Five peaks fit each gap. After nine gaps 45 are added, not more than 45, so a tenth gap is filled
-// but no eleventh.
+// Each gap takes five peaks. Gaps are filled until more than 45 beats have been added, so the tenth
+// gap is filled and the eleventh is not.
 TEST(Candidates, AtMostFiftyBeatsAreAdded) {
     envelope env = {4300, 120, {}};
     for (int64_t k = 0; k <= 12; ++k) {

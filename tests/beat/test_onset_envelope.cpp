@@ -83,8 +83,8 @@ TEST(BeatCtx, OneSecondHas42Frames) {
     EXPECT_EQ(beat.signal[3], -32768.0 / 32767.0);
     EXPECT_EQ(beat.signal[11024], 0.5);
     EXPECT_EQ(std::count(beat.rise_flags, beat.rise_flags + 11025, 0), 11025);
-    // 39.817379 mel in 37 steps, each 71.743 Hz below 1 kHz. Bins are 21.533 Hz apart. The
-    // triangle's height is 2 / 143.486.
+    // The lowest triangle spans two mel steps of 71.743 Hz each, and its height is 2 / 143.486.
+    // Bins are 21.533 Hz apart.
     const float lowest[] = {0.0f,       0.0041836f, 0.0083671f, 0.0125507f,
                             0.0111427f, 0.0069591f, 0.0027756f, 0.0f};
     for (int bin = 0; bin < 8; ++bin) EXPECT_NEAR(beat.mel_matrix[bin][0], lowest[bin], 1e-6);

@@ -9,7 +9,7 @@ namespace {
 
 constexpr size_t kBlock = 5512;
 
-// A constant sample that has this level on the 16-bit scale.
+// Returns the constant sample that has this level on the 16-bit scale.
 double sample_of_level(double level) {
     return sqrt((level + 0.5) / 32767.0);
 }
@@ -65,7 +65,7 @@ std::vector<int32_t> plain_rises(const std::vector<double> &signal) {
     return flags;
 }
 
-// n samples of noise, whose loudness changes about every two seconds.
+// Returns `n` samples of noise whose loudness changes about every two seconds.
 std::vector<double> changing_noise(size_t n, std::mt19937 *random) {
     std::vector<double> signal(n);
     double loudness = 0.1;
@@ -78,10 +78,9 @@ std::vector<double> changing_noise(size_t n, std::mt19937 *random) {
 
 }  // namespace
 
-// Silence is at the floor, -30.31 dB. A sample of 0.5 has level 8191, -12.04 dB. P60 is -12.04 dB
-// and the target twice that, level 2048: three of the ten samples around i must be loud, each
-// adding 819 to the mean. 20 blocks are measured; block b consists of the samples 5512 (b - 1) + 1
-// to 5512 b.
+// A rise is at the first sample for which the mean of the ten samples around it exceeds the target:
+// twice the 60th percentile of the levels in dB. With samples of 0.5 three of the ten must be loud.
+// 20 blocks are measured; block b consists of the samples 5512 (b - 1) + 1 to 5512 b.
 TEST(PowerRise, StartsAtTheFirstSampleAboveTheTarget) {
     constexpr size_t kBegin = 10 * kBlock;
     const struct {
@@ -92,9 +91,8 @@ TEST(PowerRise, StartsAtTheFirstSampleAboveTheTarget) {
         {kBegin + 2000, 0.5, kBegin + 1998},
         {kBegin + 3, 0.5, kBegin + 1},
         {kBlock + 2000, 0.5, kBlock + 1998},  // block 0 is never measured and counts as quiet
-        // Levels below 1000 count as the floor. A step to -28.03 dB (level 1300) is too low,
-        // because the limit is -32.03 dB. A step to -24.29 dB (2000) is not, and its target is
-        // below the floor.
+        // Levels below 1000 count as the floor. A step to level 1300 is too low to be a rise. A
+        // step to level 2000 is high enough, and its target is below the floor.
         {kBegin + 2000, sample_of_level(1300), 0},
         {kBegin + 2000, sample_of_level(2000), kBegin},
         // Ten samples of -32768 have a mean of 32769, which exceeds 16 bits. The target is 0 dB,

@@ -45,8 +45,8 @@ TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
         {{{20, 1}, {40, 1}, {27, 1.42}}, 95},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.371}}, 129},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.434}}, 95},
-        // The triple of 20 and the triple's neighbours raise its score to 1.326. Lag 27 scores
-        // 1.313 or 1.340.
+        // Lag 60, the triple of 20, and its neighbours raise the score of lag 20. Lag 27 scores
+        // slightly less or slightly more.
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.413}}, 95},
         {{{20, 1}, {59, 1}, {27, 1.1}}, 129},  // only 59: 1.109 and 1.043
@@ -65,9 +65,8 @@ TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     }
 }
 
-// The excerpt is the last minute, or the second minute of a song longer than two minutes: frames
-// 2583 to 5166 of 7750, or 416 to 2999 of 3000. A pair inside it, 20 frames apart, outweighs the
-// other.
+// The excerpt is the last minute, or the second minute of a song longer than two minutes. A pair of
+// pulses inside it, 20 frames apart, outweighs the other pair.
 TEST(Tempo, DependsOnOneMinuteOnly) {
     const std::tuple<size_t, size_t, int32_t> cases[] = {{7750, 2583, 129}, {7750, 2582, 95},
                                                          {7750, 5146, 129}, {7750, 5147, 95},

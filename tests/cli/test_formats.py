@@ -6,8 +6,8 @@ import subprocess
 
 from command_case import SONGS, Case, wav
 
-# The delay of an encoder shifts the song against the frames of the analysis, which can shift beats by one
-# frame (23 ms). So an encoded song is compared with a lossless one that has the same delay.
+# The delay of an encoder shifts the song relative to the analysis frames, which can shift beats by one frame (23 ms).
+# So an encoded song is compared with a lossless one that has the same delay.
 LATE = {"constant.mp3": "late_576.flac", "variable.mp3": "late_576.flac", "variable_bare.mp3": "late_576.flac",
         "song.aac": "late_1024.flac", "song.m4a": "late_1024.flac", "song.ogg": "song.flac"}
 
@@ -22,14 +22,14 @@ ENCODERS = {
 
 
 def lag(sound, reference):
-    """Delay of a sound against another in milliseconds, both at 11025 Hz."""
+    """Returns the delay of one sound relative to another in milliseconds, both at 11025 Hz."""
     part = reference[30000:32000]
     lags = range(-700, 700)
     return max(lags, key=lambda k: sum(map(operator.mul, part, sound[30000 + k:]))) / 11.025
 
 
 def share_near(beats, others):
-    """Share of the beats that are within 25 ms of one of the others."""
+    """Returns the fraction of the beats that are within 25 ms of one of the others."""
     return sum(any(abs(beat - other) <= 25 for other in others) for beat in beats) / len(beats)
 
 
@@ -75,7 +75,7 @@ class Formats(Case):
             if name == "edited.m4a":  # with the delay of Apple's encoder
                 self.put(name, (self.folder / name).read_bytes().replace(
                     (1024).to_bytes(4, "big") + b"\0\1\0\0", (2112).to_bytes(4, "big") + b"\0\1\0\0", 1))
-            if name == "tagged.m4a":  # the same delay in a tag of Apple's, which counts for more than the edit list
+            if name == "tagged.m4a":  # the same delay in Apple's tag, which counts for more than the edit list
                 tag = b"".join((len(atom) + 4).to_bytes(4, "big") + atom for atom in (
                     b"mean\0\0\0\0com.apple.iTunes", b"name\0\0\0\0iTunSMPB", b"data\0\0\0\1\0\0\0\0 00000000 00000840 00000000 00040998"))
                 whole = (self.folder / name).read_bytes()

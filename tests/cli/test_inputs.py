@@ -1,4 +1,4 @@
-"""Tests the choice of files: names with any bytes, folders, lists."""
+"""Tests how the files to analyse are found: names with any bytes, folders, lists."""
 import csv
 import io
 import os

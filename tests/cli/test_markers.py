@@ -24,7 +24,7 @@ FCPXML = {  # from Final Cut Pro's DTD: paths of elements and their required att
 
 
 def timecodes(base, dropped):
-    """Maps timecodes from one hour on to frame numbers. Drop-frame timecode skips the first numbers of each
+    """Maps timecodes, which start at one hour, to frame numbers. Drop-frame timecode skips the first numbers of each
     minute, except every tenth minute."""
     places = ((minute, second, frame) for minute in range(5) for second in range(60) for frame in range(base)
               if second or frame >= dropped or minute % 10 == 0)

@@ -130,7 +130,7 @@ class Store(Case):
         self.run_tavo(*words, "--force", said=b"1 stored, 2 known")
 
     def test_a_store_of_the_first_version(self):
-        """Such a store lacks offset_ms and decoder. Some rows are damaged too."""
+        """An older store lacks offset_ms and decoder. Some rows are damaged too."""
         self.put("a.wav")
         self.put("bad.wav", content=b"RIFF" + bytes(60))
         self.run_tavo(*STORE, "a.wav", "bad.wav", status=1)

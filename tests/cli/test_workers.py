@@ -73,7 +73,7 @@ class Workers(Case):
         self.assertEqual(process.returncode, 1)
 
     def test_workers_end_with_the_command_and_share_no_sockets(self):
-        # A closed socket is a signal, so no other worker may keep it open.
+        # A worker ends when the command's socket is closed, so no other worker may keep it open.
         process = self.start("-j", "2", "long.wav", "other.wav")
         workers = [self.worker_with(process, name) for name in ("long.wav", "other.wav")]
         sockets = [[to for fd, to in open_files(pid) if fd > 2 and to.startswith("socket:")] for pid in workers]

@@ -25,7 +25,7 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     EXPECT_EQ(loudness != nullptr, mode != TAVO_MODE_BEATS);
     EXPECT_EQ(points, mode != TAVO_MODE_BEATS ? (100 - 6) / 2 + 1 : 0);
     EXPECT_TRUE(loudness == nullptr || loudness[45 / 2] > 2 * loudness[35 / 2]);
-    // The nearest periods of whole hops are 21 and 22, 123 and 117 BPM.
+    // Periods are whole hops; the nearest ones are 21 (123 BPM) and 22 (117 BPM).
     EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);
     EXPECT_EQ(tavo_deinit(ctx), 0);
     EXPECT_STREQ(job::find_inconsistency(job::last, mode), nullptr);

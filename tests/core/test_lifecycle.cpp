@@ -191,7 +191,7 @@ int32_t read_after_stop(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
 }
 
 // Stopping during decoding waits for the decoding and then skips the beats but not the highlight.
-// The thread that watches for the end may be impossible to start.
+// This also holds if the thread that watches for the end cannot be started.
 TEST(Lifecycle, StopDuringDecodingSkipsTheBeats) {
     for (const bool watched : {true, false}) {
         for_each_mode(kModes, [watched](int32_t mode, TAVO_CTX *ctx) {

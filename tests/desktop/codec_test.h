@@ -60,7 +60,7 @@ struct open_source {
     open_source &operator=(const open_source &) = delete;
 };
 
-// Reads up to limit samples from the source's position. Any failure code fails the test.
+// Reads up to `limit` samples from the source's position. Any failure code fails the test.
 inline samples read(mtsrc_ctx *source, size_t limit = SIZE_MAX) {
     constexpr int32_t kRequest = 8192;  // bytes, as in a job
     samples all;

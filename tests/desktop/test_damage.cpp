@@ -33,7 +33,7 @@ struct format {
 enum kind { kFlips, kZeros, kOnes, kNoise, kJunk, kTwice, kLost, kKinds };
 constexpr const char *kNames[kKinds] = {"flips", "zeros", "ones", "noise", "junk", "twice", "lost"};
 
-// Returns the file with count bytes damaged from offset at on.
+// Returns the file with `count` bytes damaged, starting at offset `at`.
 std::string damage(std::string file, int kind, size_t at, size_t count, std::mt19937 *random) {
     std::string bytes = file.substr(at, count);
     const std::string noise = support::noise(count, (*random)());
@@ -74,7 +74,7 @@ samples read_consistently(const std::string &path, std::mt19937 *random) {
     return linear;
 }
 
-// Number of equal samples at the start, or at the end.
+// Return the number of equal samples at the start and at the end.
 size_t count_equal_at_start(const samples &a, const samples &b) {
     const auto differs = std::mismatch(a.begin(), a.end(), b.begin(), b.end()).first;
     return static_cast<size_t>(differs - a.begin());

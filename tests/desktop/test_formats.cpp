@@ -87,7 +87,7 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
         {"fragments.mp4", "low.aac"},
         {"video.mp4", "low.aac"},
         {"video.ogv", "song.ogg"},
-        // The bare source drops and averages nothing of a mono stream.
+        // The bare source neither drops nor averages samples of a mono stream.
         {"layer3.mp4", "mono.mp3"},
         // Vorbis is cut at its granule positions.
         {"golden/late.ogg", "golden/plain.ogg"},
@@ -154,7 +154,7 @@ TEST(Reader, AgreesWithFfmpeg) {
     }
 }
 
-// The second channel of a pair, which the source does not deliver.
+// Checks the second channel of each pair, which the source itself does not deliver.
 TEST(Flac, DeliversBothChannels) {
     const std::string path = fixture("song.flac");
     const mtsrc_io io = io_for(path);

@@ -38,7 +38,7 @@ TEST(Library, LoadsLibavcodecWhenNeeded) {
     EXPECT_TRUE(has_libavcodec());
 }
 
-// A copy of the library in a folder without the shared object.
+// Loads a copy of the library from a folder without the shared object.
 TEST(Library, LogsAMissingSharedObject) {
     Dl_info info = {};
     ASSERT_NE(dladdr(reinterpret_cast<void *>(xaac_init), &info), 0);

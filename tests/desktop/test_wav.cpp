@@ -15,7 +15,7 @@ samples make_samples(size_t count) {
     return pcm;
 }
 
-// Returns the file after replacing the number of size bytes at an offset.
+// Returns the file with the number of `size` bytes at offset `at` replaced.
 std::string patch(std::string file, size_t at, uint64_t value, size_t size = 2) {
     return file.replace(at, size, reinterpret_cast<const char *>(&value), size);  // little-endian
 }
@@ -61,7 +61,7 @@ TEST(Wav, ReadsUnusualHeaders) {
     }
 }
 
-// If the header is readable, an unusable format has a different code from unusable data.
+// With a readable header, the code of an unusable format differs from that of unusable data.
 TEST(Wav, RefusesUnsupportedFormats) {
     const std::string file = support::wav_bytes(make_samples(2000), 44100, 2);
     const auto with_format = [&](uint64_t tag, uint64_t bits) {

@@ -20,7 +20,7 @@ using list = std::vector<double>;
 constexpr double kInf = std::numeric_limits<double>::infinity();
 constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
-// The transform without passes: one stage and one butterfly after the other.
+// A plain transform that computes one butterfly after the other, stage by stage.
 void transform_by_stages(list &re, list &im, const TAVO_FFT_CTX &ctx) {
     const size_t size = re.size();
     for (size_t i = 0; i < size; ++i) {
@@ -78,7 +78,7 @@ TEST(Fft, RefusesSizesOtherThanPowersOfTwo) {
     EXPECT_EQ(bit_reverse2(32, 5), 0u);
 }
 
-// The sizes of a tempo excerpt, too long for the fuzzer. Values that must not be read are NaN.
+// Tests a tempo excerpt's sizes, too long for the fuzzer. Values that must not be read are NaN.
 TEST(Dft, TransformsTwoPulsesAndBack) {
     constexpr size_t kSize = 4096;
     list re(2584), im(kSize, kNan);

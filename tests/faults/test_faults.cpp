@@ -1,5 +1,5 @@
-// Every call of a memory, thread, lock or file function fails, once or from there on. Nothing
-// crashes, hangs or leaks, and each job calls back once. TAVO_FAULTS=all tries every call.
+// Makes every call of a memory, thread, lock or file function fail, alone or with all later ones.
+// Nothing crashes, hangs or leaks, and each job calls back once. TAVO_FAULTS=all tries every call.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <unistd.h>
@@ -14,7 +14,7 @@
 
 namespace {
 
-// Functions that fail together. harmless: the result is still the undisturbed one.
+// Functions that fail together. harmless: the result is the same as without the failures.
 struct group {
     const char *name;
     uint32_t calls;

@@ -11,7 +11,7 @@ namespace {
 constexpr int64_t kGiB = int64_t{1} << 30;
 constexpr int64_t kRate = 48'000;
 
-// The last second consists of samples of 1000. Sizes that do not fit the header are all ones.
+// All samples of the last second are 1000. A size that does not fit the header is all ones.
 std::string sparse_wav(int32_t channels, int64_t seconds) {
     const auto second = static_cast<size_t>(kRate * channels);
     std::string file = support::wav_bytes(std::vector<int16_t>(second, 1000), kRate, channels);

@@ -19,7 +19,7 @@
 
 namespace {
 
-// 10 log10(mean square + 1) of window samples, with full scale 1.
+// Returns 10 log10(mean square + 1) of `window` samples, with full scale 1.
 float plain_power(const int16_t *pcm, int64_t window) {
     double sum = 0.0;
     for (int64_t i = 0; i < window; ++i) sum += (pcm[i] / 32767.0) * (pcm[i] / 32767.0);
@@ -39,8 +39,8 @@ std::vector<float> expand(const std::string &pairs) {
     return power;
 }
 
-// PCM with alternating signs, unit samples per point. The value is about its mean square, with full
-// scale 1.
+// Returns PCM with alternating signs and `unit` samples per point. Each value is approximately the
+// mean square, with full scale 1.
 std::vector<int16_t> make_pcm(const std::string &pairs, int64_t unit) {
     std::vector<int16_t> pcm;
     for (const float square : expand(pairs)) {
@@ -68,7 +68,7 @@ uint32_t search(const std::string &curve, int32_t duration_s, int32_t hl_param =
     return _get_HL_simple(&hl, duration_s);
 }
 
-// Returns the valleys of 50 points, which have the value depth at dips and 1 elsewhere.
+// Returns the valleys of 50 points, which have the value `depth` at `dips` and 1 elsewhere.
 indexes find_valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f,
                      float std = 0.125f) {
     std::vector<float> values(50, 1.0f);
@@ -121,14 +121,14 @@ TEST(PowerEnvelope, HasOneValueEveryTwoSeconds) {
     EXPECT_EQ(hl.power, nullptr);
 }
 
-// Full power; then two seconds each of silence, a quarter and full power: (0 + 1/4 + 1) / 3.
+// Tests a song at full power, and a window of equal parts of silence, quarter and full power.
 TEST(PowerEnvelope, IsTenLogOfMeanSquarePlusOne) {
     EXPECT_EQ(compute_curve(make_pcm("800 1", 1)), std::vector<float>(2, 10.0f * log10f(2.0f)));
     EXPECT_NEAR(compute_curve(make_pcm("1 0 1 .25 1 1", 200))[0], 10.0 * log10(1.0 + 1.25 / 3.0),
                 1e-4);
 }
 
-// Odd and even numbers of windows: the two sections share one window or none.
+// With odd and even numbers of windows, the two sections share one window or none.
 TEST(PowerEnvelope, EqualsEachWindowSummedSeparately) {
     std::mt19937 random(11);
     for (int64_t windows = 1; windows <= 9; ++windows) {
@@ -171,10 +171,10 @@ TEST(Search, ReturnsTheBestEdge) {
         uint32_t ms;
     } cases[] = {
         {"20 0.4 10 0.9 1 1 19 0.9 10 0.4", 120, 38000},  // into the loud passage
-        // Edge at 14: 0.1 to 0.45 in one step, score 0.35 + 0.35. Edge at 28: a smaller step of
-        // 0.3, but from 0.225 on average to 0.65, score 0.425 + 0.3.
+        // The edge at 28 has a smaller step than the edge at 14, but its average rises more, so its
+        // score is higher.
         {"3 0.1 1 1 11 0.1 6 0.45 7 0.1 1 0.35 12 0.65 19 0.1", 120, 56000},
-        // Edge at 13: 0.5625 + 0.4375. Edge at 30: 0.5 + 0.5. Equal, so the larger step wins.
+        // The edges at 13 and 30 have equal scores, so the one with the larger step wins.
         {"3 0.125 1 1 9 0.125 1 0.375 7 0.8125 10 0.25 10 0.75 19 0.25", 120, 60000},
         // The step from 0.6 to 0.9 is not scored, because the average falls from 0.8 to 0.75. The
         // answer is the point after the only edge. With equal averages of 0.75 the step is scored.
@@ -203,13 +203,13 @@ TEST(Search, ReturnsTheBestEdge) {
         // the valley is the last of them: at 23, 3 after the edge at 20, or at 24.
         {"20 0.5 1 1 1 0.9 1 0.3 1 0.1 1 0.4 5 0.5 2 0.85 28 0.5", 120, 60000},
         {"20 0.5 1 1 1 0.9 1 0.5 1 0.3 1 0.1 1 0.4 4 0.5 2 0.85 28 0.5", 120, 40000},
-        // 60 of 100 values are below 0.8, the 60th percentile. The largest step, at 29, reaches it,
-        // and the next one, at 41, exceeds it.
+        // An edge must rise above the 60th percentile, which is 0.8. The largest step, at 29, only
+        // reaches it, and the next one, at 41, exceeds it.
         {"9 1 20 0.5 1 0.1 1 0.8 10 0.5 1 0.2 1 0.81 28 0.5 29 1", 204, 84000},
         {"30 1 30 0.5", 120, 0},  // no rising edge
         {"60 0", 120, 0},
-        // 9 points are skipped and 4 are too few. One point more is enough; its only edge, at 11,
-        // is not scored.
+        // Nine points are skipped, and the remaining four are too few. With one point more there
+        // are enough, but the only edge, at 11, is not scored.
         {"11 0.25 2 1", 100, 0},
         {"12 0.25 2 1", 100, 24000},
     };
@@ -338,9 +338,9 @@ TEST(Tune, StartNearTheEndsOfTheSongIsReturnedUnchanged) {
     }
 }
 
-// Window k covers the steps k to k + 2. A step to the mean square c at step s is a rise at window s
-// - 3: on average (c/3 + 2c/3 + 3c) / 5 = 0.8 c, about 3.47 c dB. It must exceed 0.13. The start
-// moves to the first of the two equal steps of 0 after it.
+// Window k covers the steps k to k + 2, so a louder step s is a rise at window s - 3. The average
+// rise of five windows must exceed 0.13 dB. The start moves to the smallest change between windows
+// after the rise, the first of two equal ones.
 TEST(Tune, MovesToTheSharpestRise) {
     // Mean squares from window 10 on: 0, 0.2, 0.3, 0.3, 0.2, 0.3, 0.3, 0.2, 0. The largest rise is
     // at 10, and the only fall in its five steps is from 13 to 14.
@@ -359,10 +359,9 @@ TEST(Tune, MovesToTheSharpestRise) {
     EXPECT_EQ(tune("6 0 5 .5 7 0 5 .5 7 0"), 2400u);
 }
 
-// 120 s, loud from 60 s to 100 s. The window at 54 s is the last without the loud part, so the
-// coarse start is 54 s. Of the 27 windows from 51 s on, window 22 is half loud, and window 23, at
-// 60.2 s, is completely loud. The largest rise is at 19, its smallest step from 23 to 24: 51 s +
-// 9.2 s.
+// The song is 120 s long and loud from 60 s to 100 s. The window at 54 s is the last without the
+// loud part, so the coarse start is 54 s. Tuning moves it to 60.2 s, the start of the first window
+// that is completely loud.
 TEST(Position, ReturnsTheTunedStart) {
     EXPECT_EQ(find_position(make_pcm("60 .04 40 .64 20 .04", kRate), 120, 58), 60200u);
     EXPECT_EQ(find_position({}, 120, 0), 0u);

@@ -1,6 +1,6 @@
 #!/bin/sh
 # same_output.sh TAVO SONG JAVA...: checks that the Java command prints the highlight and the beats as the command
-# TAVO does. TAVO's lines of the stream and the tempo are ignored, because no event carries them.
+# TAVO does. TAVO's stream and tempo lines are ignored, because no event reports them.
 set -eu
 tavo=$1
 song=$2

@@ -107,13 +107,13 @@ TEST(Recognise, FirstBytesDetermineTheType) {
     EXPECT_EQ(type_of(kAsf, [](mtsrc_file *, const int64_t *) { return -1; }), -6);
 }
 
-// The header twice, a distance apart. The second one is at the end of the file.
+// Returns the header twice, `distance` bytes apart. The second one is at the end of the file.
 std::string pair(const std::string &header, size_t distance) {
     return put(header, distance, header + zeros(1));
 }
 
-// The standard gives the bitrate in kbit/s for each index from 1 on, and the slots of a frame with
-// 1 kbit/s at 1 kHz. A slot is one byte, in Layer I four. Padding adds one slot.
+// The lists give the bitrate in kbit/s for each index from 1 on; `slots` is the number of slots of
+// a frame with 1 kbit/s at 1 kHz. A slot is one byte, in Layer I four. Padding adds one slot.
 TEST(ProbeMpeg, FindsTwoHeadersOneFrameLengthApart) {
     using list = std::vector<size_t>;
     const list kbit1 = {32, 64, 96, 128, 160, 192, 224, 256, 288, 320, 352, 384, 416, 448};

@@ -31,7 +31,7 @@ fake_codec::frame with_decoded_bytes(int32_t bytes) {
     return frame;
 }
 
-// The samples delivered for such frames: one per frame, in Ogg both.
+// Returns the samples delivered for pair frames: one per frame, or both in Ogg.
 samples expected_of(const source_row &row, const samples &values) {
     samples out;
     for (const int16_t value : values) out.insert(out.end(), row.codec == 323 ? 2 : 1, value);
@@ -73,19 +73,19 @@ TEST_F(Reading, FramesAreDecodedIntoTheQueue) {
 }
 
 // A single frame that cannot be decoded is skipped. A second one in a row ends the call without a
-// reset, as a failed read or an impossible count does. Samples in the queue stay there.
+// reset, and so does a failed read or an impossible count. Samples in the queue stay there.
 TEST_F(Reading, OneUndecodableFrameIsSkipped) {
     for_each_row([&](const source_row &row) {
         const int32_t too_many =
             1'048'575 + (row.codec == 322 ? 131'070 : 0);  // exceeds the free bytes
         const struct {
-            frames bad;  // between frames of 2 and 6
+            frames bad;  // between frames with the samples 2 and 6
             int32_t code;
             size_t resets;
         } cases[] = {{{unreadable(2)}, -6, 0},
                      {{with_read_bytes(-1)}, -6, 0},
                      {{with_read_bytes(row.frame_bytes + 1)}, -6, 0},
-                     // With a decoder.
+                     // The other cases need a decoder.
                      {{with_decoded_bytes(-2)}, -6, 0},
                      {{with_decoded_bytes(too_many)}, -6, 0},
                      {{pair_frame(4, -1)}, 1, 1},
@@ -163,8 +163,8 @@ TEST_F(Reading, LargestFlacBlockFitsTheQueue) {
     EXPECT_TRUE(got == result(0, expected) && rest.first == 1);
 }
 
-// Ogg delivers every decoded byte: 160 frames of 16,384 bytes, whose samples are the frame's
-// number.
+// Ogg delivers every decoded byte. The 160 frames have 16,384 bytes each, and every sample is its
+// frame's number.
 TEST_F(Reading, RequestsOfAnySizeAreDelivered) {
     frames numbered;
     for (int16_t i = 0; i < 160; ++i) {  // the frames fill their buffer

@@ -41,7 +41,7 @@ class Installed(unittest.TestCase):
         return run("pkg-config", *arguments, "tavo", env=environment).split()
 
     def build_and_run(self, compiler, source, *options):
-        """Returns the output of the program for the song. It runs in an empty folder, which must stay empty: no
+        """Returns the program's output for the song. It runs in an empty folder, which must stay empty: no
         click track."""
         program = source.with_suffix(".program")
         run(compiler, *options, *STRICT, source, *self.pkg_config("--cflags", "--libs"), "-o", program)
@@ -103,7 +103,7 @@ class Installed(unittest.TestCase):
         for name, folder in ((SONAME, self.lib), ("libwexaaudio.so", self.lib / "tavo"),
                              ("liblog.so", self.lib / "tavo")):
             self.assertEqual(pathlib.Path(found[name]).resolve().parent, folder.resolve(), name)
-        words = [self.tavo, "--store", "postgresql://127.0.0.1:9/x", self.song]  # by a module that is loaded only then
+        words = [self.tavo, "--store", "postgresql://127.0.0.1:9/x", self.song]  # its module is loaded on demand
         self.assertIn("refused", subprocess.run(words, text=True, capture_output=True, env=environment).stderr)
 
     def test_hardened(self):

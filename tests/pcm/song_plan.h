@@ -20,7 +20,7 @@ using support::noise, support::slice;
 using sample_run = std::vector<int16_t>;
 using signal_run = std::vector<double>;
 
-// Returns the n values of a conversion's output and the 64 zero bytes after them, and frees the
+// Returns the `n` values of a conversion's output and the 64 zero bytes after them, and frees the
 // output.
 inline signal_run read_output(double *out, int64_t n) {
     signal_run result(out, out + n + 8);
@@ -28,7 +28,7 @@ inline signal_run read_output(double *out, int64_t n) {
     return result;
 }
 
-// Converts bytes of PCM and returns the output in the same form.
+// Converts `bytes` bytes of PCM and returns the output as read_output does.
 inline signal_run convert_pcm(const void *pcm, size_t bytes, int32_t rate) {
     int64_t n = -1;
     double *out = nullptr;
@@ -43,7 +43,7 @@ inline signal_run convert_pcm(const void *pcm, size_t bytes, int32_t rate) {
 struct fake_source {
     std::string stream = {};
     int64_t at = 0;               // offset of the next byte
-    int64_t fail_at = INT64_MAX;  // offset from which on reads fail
+    int64_t fail_at = INT64_MAX;  // reads from this offset on fail
     int empty_replies = 0;        // number of empty reads before all others
     int32_t code = 0;             // result of a read before the end of the stream
     int64_t seek_target = -1;     // byte that the next seek reaches, or -1
@@ -94,8 +94,8 @@ class song_plan : public testing::Test {
         EXPECT_TRUE(fake_codec::state.objects.empty());
         EXPECT_TRUE(fake_codec::state.misuses.empty());
     }
-    // Returns the code of tavo_decode_init. Each source delivers stream from its segment's position
-    // on.
+    // Returns the code of tavo_decode_init. Each source delivers `stream`, starting at its
+    // segment's position.
     int32_t plan(int64_t duration, int32_t rate, const std::string &stream = {}) {
         release();
         std::ofstream(file.path) << head;

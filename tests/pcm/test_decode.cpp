@@ -66,7 +66,7 @@ TEST_F(DecodePlan, RefusesShortStreamsAndSegmentsTheOthers) {
             EXPECT_TRUE(seg.duration == each.duration && seg.fmt.sample_rate == each.rate);
         }
     }
-    // In a table of one record, a plan for a longer stream uses no other record and leaves got
+    // In a table of one record, a plan for a longer stream uses no other record and leaves `got`
     // unchanged.
     ASSERT_EQ(plan(50'000'000, kRate), 0);
     free(ctx.pcm);
@@ -102,7 +102,7 @@ TEST_F(DecodePlan, ClosesEverySource) {
 // Ten seconds at 8000 Hz in four segments of 2.5 s.
 class Decode : public song_plan {
  protected:
-    // Plans the decoding of the first end bytes of the stream.
+    // Plans the decoding of the first `end` bytes of the stream.
     void plan_stream(int64_t end = 160'000) {
         ASSERT_EQ(plan(kTenSeconds, kRate, slice(stream, 0, end)), 0);
     }
@@ -111,7 +111,7 @@ class Decode : public song_plan {
     std::string stream = noise(160'000, 1);
 };
 
-// The stream must extend past byte 136,000: the last segment starts at 120,000 and drops a second.
+// The stream must extend past byte 136,000: the last segment begins at 120,000 and drops 1 s.
 TEST_F(Decode, OutputEqualsTheStream) {
     for (const int64_t end : {160'000, 159'999, 136'200, 136'000, 120'000, 100'000}) {
         const int64_t want = end > 136'000 ? end : 0;
@@ -142,7 +142,7 @@ TEST_F(Decode, FailuresEndASegmentEmptyReadsDoNot) {
     EXPECT_EQ(bytes(0, 65'535), 160'000);
     EXPECT_EQ(bytes(0, 65'536), 0);
     plan_stream();
-    sources[0].fail_at = 64'000;  // seven reads fit, the eighth exceeds it
+    sources[0].fail_at = 64'000;  // inside the eighth read, which fails
     EXPECT_EQ(decode(), 160'000);
     EXPECT_EQ(ctx.seg[0].got, 57'344);
 }

@@ -22,7 +22,7 @@ class FromHighlight : public song_plan {
         ctx.ana_rate = kAnalysisRate;
         ASSERT_EQ(DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes), kBytes);
     }
-    // Expects the analysis signal of these bytes for a highlight at pos, and hl_pos to be reported.
+    // Expects the analysis signal of `bytes` for a highlight at `pos`, and the report of `hl_pos`.
     void expect_from(int64_t pos, const std::string &bytes, uint32_t hl_pos) {
         EXPECT_EQ(tavo_get_from_here(&ctx, pos), 0);
         EXPECT_EQ(ctx.pcm, nullptr);

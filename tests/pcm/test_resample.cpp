@@ -17,7 +17,7 @@ state_ptr prepare(int32_t source, int32_t target = kAnalysisRate, int32_t code =
     return state;
 }
 
-// Outputs first to n - 1 of a block average. The input is silent before sample base.
+// Returns the outputs `first` to `n` - 1 of a block average. The input is silent before `base`.
 signal_run average(int32_t source, int32_t target, int64_t first, int64_t n, const sample_run &in,
                    int64_t base = 0) {
     const int64_t count = base + int64_t(in.size());
@@ -102,7 +102,7 @@ TEST(ResampleSinc, RoundsAndWrapsSums) {
     EXPECT_EQ(filter_constant(-3, 0, 0.5f, 0), sample_run(17, -1));
     // In tap order and in single precision, 2^24 + 1 stays 2^24.
     EXPECT_EQ(filter_constant(1, 16'777'216.0f, 1, -16'777'214.0f), sample_run(17, 2));
-    // 5,000,000 is 76 * 65,536 + 19,264, and a thousand times as much is 76,294 * 65,536 - 3584.
+    // Sums that exceed 16 bits wrap, even if they also exceed 32 bits.
     EXPECT_EQ(filter_constant(5000, 0, 1000.0f, 0), sample_run(17, 19'264));
     EXPECT_EQ(filter_constant(5000, 0, 1e6f, 0), sample_run(17, -3584));
 }
@@ -145,7 +145,7 @@ TEST(ResampleRun, RefusesSizesWithoutALength) {
     }
 }
 
-// An instance with size bytes of PCM, which starts with bytes; the rest is zero.
+// Returns an instance with `size` bytes of PCM: `bytes`, then zeros.
 TAVO_CTX with_pcm(size_t size, int32_t rate, const std::string &bytes = {}) {
     TAVO_CTX ctx = {};
     ctx.pcm_bytes = static_cast<int64_t>(size);

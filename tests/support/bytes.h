@@ -24,7 +24,7 @@ inline std::string noise(size_t count, std::mt19937::result_type seed) {
     return bytes;
 }
 
-// The items first to end - 1 of a string or vector.
+// Returns the items `first` to `end` - 1 of a string or vector.
 template <typename list>
 list slice(const list &items, int64_t first, int64_t end) {
     return {items.begin() + first, items.begin() + end};

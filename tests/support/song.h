@@ -9,8 +9,8 @@
 
 namespace support {
 
-// A song with a quiet opening, a loud section from loud_at on and a quiet tail from tail_at on. The
-// first hit is at half a second, then one follows per beat.
+// A song with a quiet opening, a loud section that starts at loud_at and a quiet tail that starts
+// at tail_at. The first hit is at half a second, then one follows per beat.
 struct song_spec {
     int32_t rate = 44100;  // Hz
     int32_t channels = 2;  // the first is the loudest; each has its own noise floor

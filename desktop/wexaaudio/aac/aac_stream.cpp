@@ -37,7 +37,7 @@ constexpr int32_t kLongPreroll = 12;
 struct bit_reader {
     const uint8_t *data;
     int64_t bits;  // in data
-    int64_t at;    // beyond bits once more was read than there is
+    int64_t at;    // exceeds `bits` after a read past the end
 };
 
 // Bits past the end are 0.

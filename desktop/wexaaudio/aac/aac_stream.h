@@ -31,7 +31,7 @@ int32_t aac_rate_of_index(int32_t index);
 void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index, int32_t channels);
 
 // Completes a configuration with 0 channels from the program configuration element at the start of
-// data, a raw block. False if the element does not end within bytes.
+// `data`, a raw block. False if the element does not end within `bytes`.
 bool aac_config_add_program(aac_config *config, const uint8_t *data, int32_t bytes);
 
 // Copies a configuration and reads its first fields. False if it is too long or too short.

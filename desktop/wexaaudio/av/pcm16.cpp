@@ -19,7 +19,7 @@ constexpr float kScale = 32768.0f;
 constexpr float kRoundMagic = 12582912.0f;
 constexpr int32_t kRoundMagicBits = 0x4B400000;
 
-// Converts the first count samples, 1 to kQuad, to integers of 16 bits; the other lanes are 0.
+// Converts the first `count` samples, 1 to kQuad, to integers of 16 bits; the other lanes are 0.
 inline int_quad round_clip(const float *samples, ptrdiff_t count) {
     constexpr float_quad kMost = {32767.0f, 32767.0f, 32767.0f, 32767.0f};
     float_quad in = {};
@@ -34,7 +34,7 @@ inline int_quad round_clip(const float *samples, ptrdiff_t count) {
     return bits - kRoundMagicBits;
 }
 
-// Calls step(i, samples) for each quad of count samples and for the remainder.
+// Calls step(i, samples) for each quad of `count` samples and for the remainder.
 template <typename Step>
 inline void for_quads(ptrdiff_t count, Step step) {
     ptrdiff_t i = 0;

@@ -68,7 +68,7 @@ uint32_t be32(io_file *file, int64_t offset) {
     return static_cast<uint32_t>(number(file, offset, 4));
 }
 
-// Removes the next box from the start of a level. A box that states to be longer than the level is
+// Removes the next box from the start of a level. A box whose stated size exceeds the level is
 // shortened to it. False if no box is left.
 bool next_box(io_file *file, span *level, box *b) {
     const int64_t left = level->to - level->from;

@@ -27,7 +27,7 @@ struct mpeg_scan {
     bool started;
 };
 
-// Returns the bytes of the tag that ends at end, or 0. Tags are read backwards; a tag that is not
+// Returns the size of the tag that ends at `end`, or 0. Tags are read backwards; a tag that is not
 // in the buffer is read together with the bytes before it.
 int64_t tag_before(io_file *file, int64_t end) {
     const bool buffered = end - kId3v1Bytes >= file->block_at;
@@ -52,7 +52,7 @@ int64_t find_end(io_file *file) {
 }
 
 // True if p starts a chain of headers of one stream. The chain may be shorter if it ends exactly at
-// the end of the audio. p has got bytes; to_end bytes of audio are left.
+// the end of the audio. `p` has `got` bytes; `to_end` bytes of audio are left.
 bool starts_chain(const mpeg_scan *s, const uint8_t *p, int32_t got, int64_t to_end,
                   mpeg_header *first) {
     const mpeg_header *reference = s->started ? &s->head : nullptr;

@@ -58,7 +58,7 @@ struct ogg_scan {
     bool has_base;
     int64_t base;      // granule position of sample 0; valid if has_base
     int64_t page_end;  // end of the audio at the second-to-last page with a granule position
-    int64_t last_end;  // end of the audio by the last granule position, sample frames
+    int64_t last_end;  // end of the audio at the last granule position, sample frames
 };
 
 // Copies the first bytes of a header packet, at least its name. False if it is not a Vorbis header.
@@ -67,7 +67,7 @@ bool read_header(const ogg_scan *scan, int32_t number, uint8_t *packet, int32_t 
            packet[0] == 2 * number + 1 && memcmp(packet + 1, "vorbis", kNameBytes - 1) == 0;
 }
 
-// Packs the identification and set-up packets into p. False if they are not Vorbis headers.
+// Packs the identification and set-up packets into `p`. False if they are not Vorbis headers.
 bool pack(const ogg_scan *scan, uint8_t *p) {
     p[0] = kVorbisSetupMark;
     p[1] = kIdBytes;
@@ -142,7 +142,7 @@ void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     }
 }
 
-// Reads the page's packets by its lacing values.
+// Reads the page's packets, using its lacing values.
 bool read_segments(ogg_scan *scan, const ogg_page *page, int64_t body_first) {
     const int32_t segments = page->header[26];
     const uint8_t *lacing = page->header + 27;
@@ -231,7 +231,7 @@ bool next_page(ogg_scan *scan, ogg_page *page, int64_t *offset) {
     }
 }
 
-// Adds a stream by its first page. The first audio stream is the one to read.
+// Adds the stream whose first page this is. The first audio stream is the one to read.
 void add_stream(stream_info *info, const ogg_page *page) {
     if (info->track_count >= kOggStreams) return;
     const int32_t i = info->track_count++;

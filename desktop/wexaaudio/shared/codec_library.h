@@ -19,28 +19,28 @@ struct codec_library {
     av_decoder *(*open)(const char *name, const uint8_t *setup, int32_t setup_bytes);
     void (*close)(av_decoder *decoder);  // null is allowed
 
-    // Returns a buffer for the next packet of bytes, 1 to kMaxPacket, to be filled before decode.
-    // Null if memory runs out.
+    // Returns a buffer for the next packet of `bytes` bytes (1 to kMaxPacket), to be filled before
+    // decode. Null if memory runs out.
     uint8_t *(*packet)(av_decoder *decoder, int32_t bytes);
 
     // Decodes the packet. Returns the sample frames of the output (0: no output); -1 if it cannot
     // be decoded; kCodecNoMemory.
     int32_t (*decode)(av_decoder *decoder);
 
-    // Gives the rate in Hz and the channels of the output; 0 without output.
+    // Stores the rate in Hz and the channels of the output; 0 without output.
     void (*format)(const av_decoder *decoder, int32_t *rate, int32_t *channels);
 
-    // Writes up to count sample frames of the output from sample frame skip on, as interleaved
-    // 16-bit PCM: rounded to nearest, clipped, without dither. channels 2: front left and right, or
-    // a single channel twice. channels 1: the mean of all channels, rounded toward zero. Returns
-    // the sample frames written.
+    // Writes up to `count` sample frames of the output, starting at sample frame `skip`, as
+    // interleaved 16-bit PCM: rounded to nearest, clipped, without dither. channels 2: front left
+    // and right, or a single channel twice. channels 1: the mean of all channels, rounded toward
+    // zero. Returns the sample frames written.
     int32_t (*pcm)(const av_decoder *decoder, int32_t channels, int32_t skip, int32_t count,
                    int16_t *pcm);
 
     // setup: the three header packets in Xiph's packing. Null on failure.
     vorbis_parser *(*parser_open)(const uint8_t *setup, int32_t setup_bytes);
     void (*parser_close)(vorbis_parser *parser);  // null is allowed
-    // Sample frames of the next packet, by its first byte; 0 or less if it contains no audio.
+    // The next packet's sample frames, found from its first byte; 0 or less if it has no audio.
     int32_t (*parser_samples)(vorbis_parser *parser, uint8_t first);
 };
 

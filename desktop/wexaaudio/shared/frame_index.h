@@ -22,7 +22,7 @@ struct frame_index {
 // runs out or there are more frames or samples than any real file has.
 bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples);
 
-// Index of the frame that contains sample: the last one whose first is at or before it. 0 before
+// Index of the frame that contains `sample`: the last one whose `first` is not after it. 0 before
 // the first frame, count - 1 past the end. The index must not be empty.
 int64_t frame_index_find(const frame_index *index, int64_t sample);
 

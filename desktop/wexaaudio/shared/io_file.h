@@ -27,16 +27,16 @@ bool io_file_open(io_file *f, const mtsrc_io *io);
 // Releases what *f owns. Does nothing for a zeroed or closed record.
 void io_file_close(io_file *f);
 
-// Copies up to count bytes at offset. Returns the bytes copied, fewer only at the end of the file;
-// 0 past the end; -1 on a read error. Large copies bypass the buffer.
+// Copies up to `count` bytes at `offset`. Returns the bytes copied, fewer only at the end of the
+// file; 0 past the end; -1 on a read error. Large copies bypass the buffer.
 int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count);
 
-// Returns the buffered bytes at offset, valid until the next call. *got receives their count: at
+// Returns the buffered bytes at `offset`, valid until the next call. *got receives their count: at
 // least min(want, bytes to the end of the file), often more. want <= kMaxLook. Returns null outside
 // the file and on a read error, which sets failed.
 const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *got);
 
-// Returns exactly count bytes at offset, as io_file_peek does. Null if the file has fewer.
+// Returns exactly `count` bytes at `offset`, as io_file_peek does. Null if the file has fewer.
 const uint8_t *io_file_bytes(io_file *f, int64_t offset, int32_t count);
 
 #endif

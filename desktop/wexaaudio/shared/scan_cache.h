@@ -53,8 +53,8 @@ struct stream_info {
 // a failure.
 typedef bool (*scan_function)(io_file *file, stream_info *info);
 
-// The result for an open file, from another reader or from a new scan. Null if the scan fails. The
-// caller returns it with scan_cache_put. May be called on any thread.
+// Returns the result for an open file, from another reader or from a new scan. Null if the scan
+// fails. The caller returns it with scan_cache_put. May be called on any thread.
 const stream_info *scan_cache_get(io_file *file, scan_function scan);
 
 void scan_cache_put(const stream_info *info);  // null is allowed

@@ -35,7 +35,7 @@ int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     return held == -1 ? 0 : held;
 }
 
-// Decodes frame next and, with a fresh decoder, the frames that it depends on.
+// Decodes frame `next` and, if the decoder is fresh, first the frames that it depends on.
 int32_t decode_next(stream_reader *r) {
     const stream_info *info = r->info;
     int64_t n = r->next;

@@ -1,6 +1,6 @@
-// Reads one stream of compressed frames as 16-bit PCM from any sample on. AAC, MPEG audio, MP4 and
-// Ogg share this code: their readers are records of this type, and the same functions read, seek
-// and delete them.
+// Reads one stream of compressed frames as 16-bit PCM, starting at any sample. AAC, MPEG audio, MP4
+// and Ogg share this code: their readers are records of this type, and the same functions read,
+// seek and delete them.
 //
 // In: the frames that a format's scan finds. Out: PCM, frame by frame, for the copying decoders.
 #ifndef WEXAAUDIO_STREAM_H
@@ -22,8 +22,8 @@ struct stream_reader {
 // memory runs out. *duration receives the duration of the stream in 100-ns units.
 stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration);
 
-// Copies bytes from an offset as in frame_entry, which is a logical one for Ogg. Returns the bytes
-// copied, fewer if the pages or the file end first; -1 on a read error.
+// Copies bytes starting at an offset of the kind in frame_entry, which is logical for Ogg. Returns
+// the bytes copied, fewer if the pages or the file end first; -1 on a read error.
 int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
                     int64_t bytes);
 
