@@ -99,10 +99,10 @@ class song_plan : public testing::Test {
     int32_t plan(int64_t duration, int32_t rate, const std::string &stream = {}) {
         release();
         std::ofstream(file.path) << head;
-        spec.channels = 1;
-        spec.duration = duration;
-        spec.sample_rate = rate;
-        fake_codec::state.streams.push_back(spec);
+        codec_stream.channels = 1;
+        codec_stream.duration = duration;
+        codec_stream.sample_rate = rate;
+        fake_codec::state.streams.push_back(codec_stream);
         const TAVO_PARAM param = {file.path.c_str(), 0};
         const int32_t code = tavo_decode_init(&ctx, &param);
         for (int32_t i = 0; code == 0 && i < ctx.seg_count; ++i) {
@@ -119,7 +119,7 @@ class song_plan : public testing::Test {
     }
     const support::temporary_file file{"pcm"};
     std::string head = "fLaC and some more";  // the bytes that recognition reads
-    fake_codec::stream_spec spec;
+    fake_codec::stream_spec codec_stream;
     fake_source sources[4];
     TAVO_CTX ctx = {};
 };

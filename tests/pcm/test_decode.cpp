@@ -32,7 +32,7 @@ TEST_F(DecodePlan, RefusesShortStreamsAndSegmentsTheOthers) {
         {200'000'000, INT64_MIN, 8000, -2, 0, 320'000},
     };
     head = "RIFF....WAVEfmt ";
-    spec.seeks = {{1, {}}};  // no position is reported, so the requested one counts
+    codec_stream.seeks = {{1, {}}};  // no position is reported, so the requested one counts
     for (const auto &each : cases) {
         SCOPED_TRACE(testing::Message() << each.duration << ' ' << each.start << ' ' << each.rate);
         int32_t code = plan(each.duration, each.rate);
@@ -76,7 +76,7 @@ TEST_F(DecodePlan, RefusesShortStreamsAndSegmentsTheOthers) {
     EXPECT_EQ(construct_decbuf(&ctx, 160'000'000), 0);
     EXPECT_TRUE(ctx.seg_count == 1 && ctx.seg[0].cap == 64'000 && ctx.seg[0].got == 7);
     ctx.duration = 50'000'000;
-    spec.seeks = {{0, 1234}};
+    codec_stream.seeks = {{0, 1234}};
     EXPECT_EQ(plan(kTenSeconds, kRate), 0);
     for (int32_t i = 0; i < 4; ++i) EXPECT_EQ(ctx.seg[i].seek_pos, 1234);
 }

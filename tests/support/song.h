@@ -1,5 +1,5 @@
 // Synthetic songs with a known loud section, tempo and drum hits, and WAV files of them. The same
-// spec always gives the same samples.
+// plan always gives the same samples.
 #ifndef TAVO_TESTS_SUPPORT_SONG_H
 #define TAVO_TESTS_SUPPORT_SONG_H
 
