@@ -9,8 +9,8 @@ pthread_cond_t *feat_cond_mt = nullptr;
 
 namespace {
 
-// Number of whole analysis frames, one per hop. The division truncates toward zero, so a signal a
-// little shorter than a frame counts as one frame, which is never read.
+// Returns the number of whole analysis frames. The division truncates toward zero, so a signal that
+// is less than one hop too short for a frame still counts as one frame, which is never read.
 int64_t count_frames(int64_t samples, int32_t frame_size, int32_t hop_size) {
     if (frame_size < 1 || hop_size < 1) return 0;
     return (samples - frame_size) / hop_size + 1;
@@ -36,8 +36,8 @@ void release(T **items) {
     *items = nullptr;
 }
 
-// Lower edge of band k, which is also the centre of the previous band. Every step is in single
-// precision.
+// Returns the lower edge of band `k` in Hz, which is also the centre of the previous band. Every
+// step is rounded to single precision.
 float band_edge(float top_mel, uint64_t k, uint32_t nbands) {
     const float fraction = static_cast<float>(k) / static_cast<float>(uint64_t{nbands} + 1);
     return Mel2Hz(top_mel * fraction + 0.0f);

@@ -1,7 +1,7 @@
-// Sets up stage 4: the context of one beat analysis, and the lock of its worker groups.
+// Sets up stage 4: creates the context of one beat analysis and the lock of its worker groups.
 //
-// Input: TAVO_CTX with ana, ana_len, ana_rate and onset. The context lives for one call of
-// getBeatPosition.
+// Input: a TAVO_CTX with ana, ana_len, ana_rate and onset. Output: a TAVO_BEAT_CTX, which lives for
+// one call of getBeatPosition.
 #ifndef TAVO_BEAT_BEAT_CTX_H
 #define TAVO_BEAT_BEAT_CTX_H
 
@@ -16,60 +16,62 @@
 constexpr int32_t kMelBands = 36;
 constexpr int32_t kBeatWorkers = 4;
 
-// F = frame_count, n = samples of the analysis signal, N = samples of an analysis frame.
+// In the array sizes below, F is frame_count, n is the length of the analysis signal in samples,
+// and N is the length of an analysis frame in samples.
 struct TAVO_BEAT_CTX {
     double *onset_env;     // [F] spectral flux per analysis frame; the last entry stays 0
     float **mel_matrix;    // [N / 2] rows, one per FFT bin, of [36] band weights
-    float *frame_times;    // [F] seconds, (k + 1) hops
-    double *signal;        // [n] ana / 32767
+    float *frame_times;    // [F] seconds; entry k is the time after k + 1 hops
+    double *signal;        // [n] ana divided by 32767
     double *threshold;     // [F] the threshold curve; the last entry stays 0
-    int32_t *rise_frames;  // [rise_count] analysis frames of the power rises; may be null
+    int32_t *rise_frames;  // [rise_count] analysis frames in which power rises start; may be null
     int32_t rise_count;
-    int32_t *rise_flags;  // [n] 1 at the sample where a power rise starts
+    int32_t *rise_flags;  // [n] 1 at each sample where a power rise starts, otherwise 0
     int32_t half_frame;   // N / 2
     int64_t frame_count;  // F
-    double hop_seconds;   // hop / rate
-    int32_t band_count;   // 36
+    double hop_seconds;
+    int32_t band_count;  // 36
 };
 
 static_assert(sizeof(void *) != 8 || (offsetof(TAVO_BEAT_CTX, rise_flags) == 56 &&
                                       offsetof(TAVO_BEAT_CTX, band_count) == 88));
 
-// Samples of the analysis signal. samples[i] / full_scale is between -1 and 1. full_scale is 32767
-// for an instance's ana and 1 for TAVO_BEAT_CTX.signal.
+// A view of the analysis signal. Dividing a sample by full_scale gives a value in the nominal range
+// -1 to 1. full_scale is 32767 for TAVO_CTX.ana and 1 for TAVO_BEAT_CTX.signal.
 struct sample_view {
     const double *samples;
     double full_scale;
 };
 
-constexpr double kFullScale = 32767.0;  // of ana
+constexpr double kFullScale = 32767.0;  // full scale of TAVO_CTX.ana
 
 extern "C" {
 
-// Shared by both worker groups of this folder, from __beat_init to __tavo_deinit; otherwise null.
+// The lock and condition that both worker groups of this folder share. They exist from __beat_init
+// to __tavo_deinit and are null otherwise.
 extern pthread_mutex_t *feat_mutex_mt;
 extern pthread_cond_t *feat_cond_mt;
 
-// Fills a zeroed context from the instance. If memory runs out, some of its fields stay null.
+// Fills a zeroed context from the instance. If memory runs out, some of its pointers stay null.
 void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
 
-// Releases what the context owns, the lock and the condition, but not the record itself.
+// Releases everything the context owns, the lock and the condition, but not the context itself.
 void __tavo_deinit(TAVO_BEAT_CTX *beat);
 
-// Fills matrix[bin][band] with the weights of `nbands` triangles for bins 0 .. nfft / 2 - 1. The
-// triangles have unit area and are equally spaced on the mel scale from 0 to `fmax` Hz.
+// Fills matrix[bin][band] for the lower nfft / 2 bins with the weights of `nbands` triangular
+// filters, which have unit area and are equally spaced on the mel scale from 0 to `fmax` Hz.
 void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float **matrix);
 }
 
-// Divides the first `count` samples of `view` by its full scale.
+// Divides the first `count` samples of `view` by its full scale and stores the results in `scaled`.
 void scale_samples(sample_view view, int64_t count, double *scaled);
 
-// The body of __beat_init. Jobs read `ana` directly and set with_signal to false: `signal` and
-// rise_flags, 12 bytes per sample, then stay null. Returns false if memory runs out for any other
-// field.
+// Implements __beat_init. Jobs read `ana` directly and pass false for with_signal: then `signal`
+// and rise_flags, which would take 12 bytes per sample, stay null. Returns false if memory runs out
+// for any other field.
 bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat);
 
-// Length of the analysis signal in samples; 0 if ana is null.
+// Returns the length of the analysis signal in samples, or 0 if `ana` is null.
 inline int64_t analysis_length(const TAVO_CTX *ctx) {
     return ctx->ana != nullptr && ctx->ana_len > 0 ? ctx->ana_len : 0;
 }

@@ -10,18 +10,18 @@
 
 namespace {
 
-// Result of a stage; anything except going_on ends the analysis.
+// The result of a stage. Any value except going_on ends the analysis.
 enum outcome { going_on, stopped, out_of_memory };
 
 outcome check_stop(const TAVO_CTX *ctx) {
     return load_flag(&ctx->quit) != 0 ? stopped : going_on;
 }
 
-// Arguments and result of the search for power rises, which runs in parallel to the onset envelope.
+// Arguments and result of the search for power rises, which runs alongside the onset envelope.
 struct rise_search {
     const TAVO_CTX *ctx;
-    int32_t count;     // or TAVO_ERR_MEMORY
-    int64_t *samples;  // [count] owned
+    int32_t count;     // number of rises, or TAVO_ERR_MEMORY
+    int64_t *samples;  // [count] samples where rises start, owned
 };
 
 sample_view view_of(const TAVO_CTX *ctx) {
@@ -63,7 +63,7 @@ outcome find_tempo(TAVO_ONSET_CTX *onset, const TAVO_BEAT_CTX *beat) {
     return going_on;
 }
 
-// Stores the beats in an array of exactly their number. Without beats the array stays null.
+// Stores the beats in an array of exactly the right size. Without beats, the array stays null.
 outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
     auto *times = zeroed_items<float>(candidate_capacity(beat));
     if (times == nullptr) return out_of_memory;
@@ -92,7 +92,7 @@ outcome analyse(const TAVO_CTX *ctx, TAVO_BEAT_CTX *beat) {
     return end;
 }
 
-// Releases the beats of an earlier analysis by the same instance.
+// Releases the beats that an earlier analysis left in the instance.
 void release_beats(TAVO_ONSET_CTX *onset) {
     free(onset->beat_times);
     onset->beat_times = nullptr;

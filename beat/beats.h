@@ -1,7 +1,8 @@
-// Stages 4 to 6: the beats and the tempo of the analysis signal.
+// Stages 4 to 6: finds the beats and the tempo of the analysis signal.
 //
-// Input: TAVO_CTX with ana, ana_len, ana_rate. Output: TAVO_ONSET_CTX bpm, beat_count, beat_times
-// (ms from the start of the signal). Follows pcm/resample.h; precedes the callback.
+// Input: a TAVO_CTX with ana, ana_len, ana_rate and onset. Output: bpm, beat_count and beat_times
+// (ms from the start of the signal) in its TAVO_ONSET_CTX. Follows pcm/resample.h and precedes the
+// callback.
 #ifndef TAVO_BEAT_BEATS_H
 #define TAVO_BEAT_BEATS_H
 
@@ -9,8 +10,9 @@
 
 extern "C" {
 
-// Returns the number of beats and sets the state to finished. If a check before the onset
-// envelope or after the tempo finds a stop request, returns 0 and leaves the state unchanged.
+// Finds the beats, sets the state to finished and returns the number of beats. If a stop was
+// requested before the onset envelope or the tempo was computed, returns 0 and leaves the state
+// unchanged.
 int32_t getBeatPosition(TAVO_CTX *ctx);
 
 // Releases the beats and the record itself. Null is ignored.

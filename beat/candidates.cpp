@@ -9,25 +9,25 @@
 namespace {
 
 constexpr double kMinute = 60.0;         // seconds
-constexpr int32_t kSlowBpm = 95;         // up to this tempo beats are at least kSlowSpan apart
+constexpr int32_t kSlowBpm = 95;         // up to this tempo, beats are at least kSlowSpan apart
 constexpr float kSlowSpan = 3.0f;        // seconds
 constexpr float kFastSpan = 1.0f;        // seconds
-constexpr int32_t kBeatPerFrame = 2583;  // the fastest tempo: one beat per analysis frame
-constexpr double kWindowBeats = 4.0;     // beat periods in the threshold's window
+constexpr int32_t kBeatPerFrame = 2583;  // BPM, the fastest tempo: one beat per analysis frame
+constexpr double kWindowBeats = 4.0;     // length of the threshold's window in beat periods
 constexpr float kMsPerSecond = 1000.0f;
 
-// Distances between beats at one tempo.
+// Distances that depend on the tempo.
 struct spacing {
-    float span;        // seconds: a whole number of beat periods, the smallest beat distance
+    float span;        // smallest distance between beats in seconds, a whole number of periods
     int32_t distance;  // span in analysis frames
-    int32_t window;    // analysis frames in the threshold's window, even
+    int32_t window;    // length of the threshold's window in analysis frames, even
 };
 
 spacing spacing_at(int32_t bpm, float hop) {
     const double period = kMinute / bpm;
     const float least = bpm <= kSlowBpm ? kSlowSpan : kFastSpan;
     spacing beats = {};
-    // Single precision on purpose: its rounding is part of the result.
+    // Computed in single precision on purpose: the rounding is part of the result.
     while (beats.span < least) beats.span += static_cast<float>(period);
     beats.distance = static_cast<int32_t>(beats.span / hop);
 
@@ -37,7 +37,8 @@ spacing spacing_at(int32_t bpm, float hop) {
     return beats;
 }
 
-// Peaks near a power rise come first and need not exceed the threshold. Returns how many it wrote.
+// Writes the times (s) of the accepted peaks and returns their number. Peaks near a power rise come
+// first in the list and need not exceed the threshold.
 int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const double *thr,
                      int32_t max_beats, float *out) {
     int32_t accepted = 0;
@@ -50,7 +51,8 @@ int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const do
     return accepted;
 }
 
-// Writes the beat times to out. thr: [F - 1] zeroed; peaks: zeroed. Returns the number of beats.
+// Writes the beat times (ms) to `out` and returns their number. thr[F - 1] and the frames of
+// `peaks` must be zeroed.
 int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *thr,
                       PEAK_LIST *peaks, float *out) {
     const int64_t count = beat->frame_count > 1 ? beat->frame_count - 1 : 0;
@@ -64,8 +66,8 @@ int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *
     peaks->count = found > 0 ? found : 0;
     std::copy(thr, thr + count, beat->threshold);
 
-    // std::sort allocates nothing. qsort may allocate, and if memory runs out it falls back to an
-    // algorithm that reads out of bounds with comparators that never report equality.
+    // std::sort does not allocate. qsort may, and if memory runs out, it falls back to an algorithm
+    // that reads out of bounds when a comparator never reports equality.
     const int32_t accepted = select_beats(beat, peaks, thr, onset->max_beats, out);
     std::sort(peaks->frames, peaks->frames + peaks->count);
     std::sort(out, out + accepted);
@@ -75,7 +77,8 @@ int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *
     return total;
 }
 
-// Capacity of the peak list: half the frames, as no two peaks are neighbours, plus the rises.
+// Returns the capacity of the peak list: half the analysis frames, because peaks are never
+// adjacent, plus one entry per power rise.
 int64_t peak_capacity(const TAVO_BEAT_CTX *beat) {
     return (beat->frame_count > 0 ? beat->frame_count / 2 : 0) + beat->rise_count;
 }

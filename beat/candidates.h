@@ -1,5 +1,5 @@
-// Stage 6: selects beats among the peaks of the onset envelope. Follows beat/tempo.h,
-// beat/power_rise.h and beat/threshold.h; precedes beat/beats.h.
+// Stage 6: selects the beats from the peaks of the onset envelope. Follows beat/tempo.h,
+// beat/power_rise.h and beat/threshold.h, and precedes beat/beats.h.
 #ifndef TAVO_BEAT_CANDIDATES_H
 #define TAVO_BEAT_CANDIDATES_H
 
@@ -7,12 +7,12 @@
 
 extern "C" {
 
-// Writes the beat times (ms, ascending) to `out`, which has candidate_capacity entries. Returns the
-// number of beats, or 0 if memory runs out.
+// Writes the beat times (ms, ascending) to `out`, which must have candidate_capacity entries.
+// Returns the number of beats, or 0 if memory runs out.
 int32_t getBeatCandi_MT(TAVO_BEAT_CTX *beat, TAVO_ONSET_CTX *onset, float *out);
 }
 
-// The largest number of beats: every peak, every power rise and every beat added to a gap.
+// Returns the largest possible number of beats: one per peak, power rise and beat added in a gap.
 int64_t candidate_capacity(const TAVO_BEAT_CTX *beat);
 
 #endif

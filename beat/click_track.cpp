@@ -15,7 +15,7 @@ constexpr size_t kHeaderBytes = 44;
 constexpr uint32_t kFileRate = kAnalysisRate;  // Hz
 constexpr uint32_t kFileSampleBytes = 2;
 constexpr double kBlipHz = 4000.0;
-constexpr double kBlipScale = 160.0;  // brings the blip's peak to about a quarter
+constexpr double kBlipScale = 160.0;  // scales the peak of the blip to about 0.25
 constexpr float kBlipSeconds = 0.1f;
 constexpr double kBlipGain = 2.5;
 constexpr int32_t kChunk = 2048;  // samples per write
@@ -38,7 +38,7 @@ int32_t blip_length(int32_t sr) {
     return sr > 0 ? static_cast<int32_t>(static_cast<float>(sr) * kBlipSeconds) : 0;
 }
 
-// A 4 kHz tone that swells for a tenth of its length and then fades.
+// Generates a 4 kHz tone that swells for a tenth of its length and then fades.
 void make_blip(int32_t sr, int32_t length, float *blip) {
     const int32_t tenth = length / 10;
     const auto tau = static_cast<float>(tenth);
@@ -49,7 +49,8 @@ void make_blip(int32_t sr, int32_t length, float *blip) {
     }
 }
 
-// Index of the sample nearest to a beat. n for a beat past the end, -1 for one before the start.
+// Returns the index of the sample nearest to a beat (ms): `n` if the beat is past the end of the
+// track, -1 if it is before the start.
 int64_t beat_sample(float beat, int32_t sr, int64_t n) {
     const float samples = beat * static_cast<float>(sr) / 1000.0f;
     const double nearest = static_cast<double>(samples) + 0.5;
@@ -57,8 +58,8 @@ int64_t beat_sample(float beat, int32_t sr, int64_t n) {
     return nearest < static_cast<double>(n) ? static_cast<int64_t>(nearest) : n;
 }
 
-// If the end of the track cuts a blip, the blip stops one sample early, and later blips keep the
-// shortened length.
+// Copies the blip to each beat. A blip that would extend past the end of the track stops one sample
+// short of the end, and later blips keep the shortened length.
 void copy_blips(const float *blip, int64_t length, const float *beats, int32_t count, int32_t sr,
                 int64_t n, float *track) {
     for (int32_t b = 0; b < count; ++b) {
@@ -69,7 +70,7 @@ void copy_blips(const float *blip, int64_t length, const float *beats, int32_t c
     }
 }
 
-// Mixes one sample and returns its low 16 bits.
+// Mixes a sample of the signal with one of the blip track. Returns the low 16 bits of the result.
 uint32_t mix_sample(double signal, float blip) {
     const double mixed = (signal * kFullScale + blip * kBlipGain * kFullScale) * 0.5;
     if (!(fabs(mixed) < INT32_MAX)) return 0;
@@ -96,9 +97,9 @@ int32_t makeWaveHeader(uint32_t n, FILE *stream) {
     put_u32(header + 4, kFileSampleBytes * n + 36);
     put_tag(header + 8, "WAVE");
     put_tag(header + 12, "fmt ");
-    put_u32(header + 16, 16);  // bytes of the format chunk
+    put_u32(header + 16, 16);  // size of the format chunk
     put_u16(header + 20, 1);   // integer PCM
-    put_u16(header + 22, 1);   // channel
+    put_u16(header + 22, 1);   // channels
     put_u32(header + 24, kFileRate);
     put_u32(header + 28, kFileRate * kFileSampleBytes);
     put_u16(header + 32, kFileSampleBytes);
@@ -117,8 +118,8 @@ void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, flo
     free(blip);
 }
 
-// Allocates memory before it creates the file, so that no unfinished file is left. Makes the blips
-// afterwards, so that no time is spent on them if the file cannot be created.
+// Memory is allocated before the file is created, so that a failure leaves no unfinished file. The
+// blips are generated afterwards, so that no time is spent on them if the file cannot be created.
 void write_click_track(const TAVO_CTX *ctx) {
     if (fnamedec == nullptr || fnamedec[0] == '\0') return;
     const int64_t n = analysis_length(ctx);

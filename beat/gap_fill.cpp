@@ -2,22 +2,22 @@
 
 namespace {
 
-constexpr int32_t kPerGap = 5;        // most beats added to one gap
-constexpr int32_t kEnoughAdded = 45;  // no further gap is filled once more than this are added
-constexpr float kLongGap = 6.0f;      // seconds, at any tempo
+constexpr int32_t kPerGap = 5;        // maximum number of beats added in one gap
+constexpr int32_t kEnoughAdded = 45;  // once more beats are added, no further gap is filled
+constexpr float kLongGap = 6.0f;      // seconds; a gap this long is filled at any tempo
 constexpr float kSpansInGap = 3.0f;
 constexpr int32_t kTimeLead = 2;  // a beat's time is two hops after the start of its analysis frame
 
 static_assert(kEnoughAdded + kPerGap == kMaxAddedBeats);
 
-// A value of the envelope at one or more candidates.
+// A value of the envelope, and the candidates that have it.
 struct value_rank {
     double value;
     int32_t first;  // index of the first candidate with this value, or -1
     int32_t times;  // number of candidates with this value
 };
 
-// Finds the largest value below *bound, or the largest of all if bound is null.
+// Finds the largest value below *bound, or the largest of all values if `bound` is null.
 value_rank next_largest(const int32_t *candidates, int32_t count, const double *env,
                         const double *bound) {
     value_rank best = {0.0, -1, 0};
@@ -33,8 +33,8 @@ value_rank next_largest(const int32_t *candidates, int32_t count, const double *
     return best;
 }
 
-// Writes the maxn strongest candidates, strongest first. If several are equal, the first of them is
-// written once for each.
+// Writes the `maxn` strongest candidates, strongest first. If several are equally strong, the first
+// one is written in place of each of them.
 int32_t write_strongest(const int32_t *candidates, int32_t count, int32_t maxn, const double *env,
                         int32_t *dst) {
     int32_t written = 0;
@@ -56,7 +56,7 @@ int32_t bringMoreBeat(int32_t a, int32_t b, int32_t *dst, const int32_t *peaks, 
     if (maxn < 1) return 0;
     int32_t begin = 0;
     while (begin < npeaks && peaks[begin] < a) ++begin;
-    ++begin;  // skips the peak of the beat that begins the gap
+    ++begin;  // skip the peak of the beat that starts the gap
     int32_t end = begin;
     while (end < npeaks && peaks[end] < b) ++end;
     if (begin >= npeaks) return 0;

@@ -10,45 +10,45 @@ namespace {
 
 constexpr double kPowerFloor = 0.0001;  // -80 dB
 
-constexpr int64_t kRows =
-    3;  // mel rows of a worker: of the current two frames and the previous one
+constexpr int64_t kRows = 3;  // mel rows that a worker keeps: the current two and the previous one
 
 typedef double mel_row[kMelBands];
 
-// A worker of compute_onset_envelope. Its signal, spectrum and mel are null: the samples come from
-// view, and rows are not kept.
+// A worker of compute_onset_envelope. In its `worker`, the signal, spectrum and mel pointers are
+// null, because it reads the samples through `view` and keeps only the last few mel rows.
 struct group_worker {
     TAVO_ONSET_WORKER worker;
     sample_view view;
-    double *flux;         // [F - 1] shared; a worker fills entries first to last - 1
-    mel_row rows[kRows];  // row k % kRows: decibels of frame k
-    mel_row first_row;    // decibels of the worker's first frame
+    double *flux;         // [F - 1] shared; this worker fills entries first to last - 1
+    mel_row rows[kRows];  // row k % kRows holds the decibels of analysis frame k
+    mel_row first_row;    // decibels of the worker's first analysis frame
     bool is_complete;
 };
 static_assert(offsetof(group_worker, worker) == 0);  // the thread entry accepts both records
 
-// The four workers of one envelope and their shared buffers. Zero before they are allocated.
+// The four workers of one envelope and their shared buffers. All fields start as zero.
 struct onset_group {
     group_worker members[kBeatWorkers];
     int32_t done[kBeatWorkers];
-    double *window;    // [N]
-    TAVO_FFT_CTX fft;  // of size N
-    double *flux;      // [F - 1]
+    double *window;    // [N] Hann window
+    TAVO_FFT_CTX fft;  // tables for size N
+    double *flux;      // [F - 1] spectral flux
 };
 
 // A non-zero weight of the mel matrix.
 struct mel_term {
     double_pair weight;
-    const double_pair *power;  // of its bin
+    const double_pair *power;  // power of the weight's bin
 };
 
-// Scratch of one worker. Lane 0 is analysis frame k, lane 1 the next one.
+// Scratch memory of one worker. In each pair, lane 0 belongs to analysis frame k and lane 1 to the
+// next one.
 struct worker_scratch {
     double *samples;         // [N + H] scaled samples of both frames
     double_pair *transform;  // [2 N]
-    double_pair *powers;     // [N / 2] of both frames
-    mel_term *terms;         // terms of all bands, ordered by band, then bin
-    int64_t *band_end;       // [bands] index past the band's last term
+    double_pair *powers;     // [N / 2] bin powers of both frames
+    mel_term *terms;         // terms of all bands, ordered by band and then by bin
+    int64_t *band_end;       // [bands] index after the band's last term
 };
 
 double *create_hann_window(int32_t size) {
@@ -60,7 +60,7 @@ double *create_hann_window(int32_t size) {
     return window;
 }
 
-// The group_worker that the record belongs to; null for a caller's own record.
+// Returns the group_worker that contains the record; null for a record passed by a direct caller.
 group_worker *group_record(TAVO_ONSET_WORKER *worker) {
     return worker->signal == nullptr ? reinterpret_cast<group_worker *>(worker) : nullptr;
 }
@@ -97,7 +97,8 @@ void release_scratch(worker_scratch *scratch) {
     free(scratch->band_end);
 }
 
-// Scales the samples of frames `k` and `next`, except those shared with the two previous frames.
+// Scales the samples of analysis frames `k` and `next`. Samples that frame `k` shares with the
+// previous pair are already scaled, so they are only moved.
 void scale_frames(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next, double *samples) {
     const group_worker *record = group_record(worker);
     sample_view view = record != nullptr ? record->view : sample_view{worker->signal, 1.0};
@@ -109,7 +110,7 @@ void scale_frames(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next, double *sa
     scale_samples(view, size + (next - k) * hop - kept, samples + kept);
 }
 
-// Computes the powers of frames `k` and `next` and fills their spectrum rows if the record has any.
+// Computes the bin powers of analysis frames `k` and `next` and fills their spectrum rows, if any.
 void compute_spectrum(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
                       const worker_scratch *scratch) {
     const int32_t size = worker->frame_size;
@@ -132,8 +133,8 @@ double *mel_row_of(TAVO_ONSET_WORKER *worker, int64_t k) {
     return record != nullptr ? record->rows[k % kRows] : worker->mel[k];
 }
 
-// Fills the mel rows of frames `k` and `next`. As in MultiplyMtxs, terms with a zero factor are
-// skipped.
+// Fills the mel rows of analysis frames `k` and `next`. Terms with a zero factor are skipped, as in
+// MultiplyMtxs.
 void compute_bands(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
                    const worker_scratch *scratch) {
     double *row = mel_row_of(worker, k);
@@ -151,7 +152,7 @@ void compute_bands(TAVO_ONSET_WORKER *worker, int64_t k, int64_t next,
     }
 }
 
-// Mean absolute difference of two rows: rises and falls both count.
+// Returns the mean absolute difference of two mel rows, so both rises and falls count.
 double spectral_flux(const double *row, const double *next) {
     double sum = 0.0;
     for (int32_t band = 0; band < kMelBands; ++band) {
@@ -161,7 +162,8 @@ double spectral_flux(const double *row, const double *next) {
     return sum / kMelBands;
 }
 
-// Computes the flux from each of the frames k - 1 to end - 2 to the frame after it.
+// Computes the spectral flux into analysis frames `k` to `end` - 1 from the ones before them. The
+// frame before the worker's first one belongs to another worker, so fill_envelope adds that flux.
 void compute_flux(group_worker *record, int64_t k, int64_t end) {
     for (; k < end; ++k) {
         const double *row = record->rows[k % kRows];
@@ -173,8 +175,8 @@ void compute_flux(group_worker *record, int64_t k, int64_t end) {
     }
 }
 
-// Computes a worker's analysis frames, two at a time; the last of an odd number is paired with
-// itself. If memory runs out, the rows of a record that is not part of a group stay unchanged.
+// Processes a worker's analysis frames two at a time. If their number is odd, the last one is
+// paired with itself. If memory runs out, the rows of a direct caller's record stay unchanged.
 void run_onset_worker(void *argument) {
     auto *worker = static_cast<TAVO_ONSET_WORKER *>(argument);
     group_worker *record = group_record(worker);
@@ -203,8 +205,8 @@ bool allocate_group(int64_t frames, int32_t frame_size, onset_group *group) {
     return group->fft.cos_table != nullptr && group->window != nullptr && group->flux != nullptr;
 }
 
-// Fills one worker's record. A single frame is given to no worker, because it may extend past the
-// end of the signal.
+// Fills one worker's record. If there is only one analysis frame, no worker gets it, because it may
+// extend past the end of the signal.
 void fill_worker(const TAVO_BEAT_CTX *beat, sample_view view, int32_t id, int32_t frame_size,
                  int32_t hop_size, onset_group *group) {
     const int64_t length = beat->frame_count / kBeatWorkers;
@@ -228,7 +230,7 @@ void fill_worker(const TAVO_BEAT_CTX *beat, sample_view view, int32_t id, int32_
     worker->window = group->window;
 }
 
-// Returns true if every worker computed all of its frames.
+// Runs the workers and the side work. Returns true if every worker processed all of its frames.
 bool run_group(onset_group *group, const side_work *side) {
     worker_slot slots[kBeatWorkers];
     for (int32_t id = 0; id < kBeatWorkers; ++id) {
@@ -240,8 +242,8 @@ bool run_group(onset_group *group, const side_work *side) {
                        [](const group_worker &member) { return member.is_complete; });
 }
 
-// Fills env[count] with the spectral flux between neighbouring frames, divided by its standard
-// deviation. Adds the flux from each worker's last frame to the first one of the next worker.
+// Computes the flux that the workers left out, from each worker's last analysis frame to the first
+// one of the next worker. Then fills env[count] with the flux divided by its standard deviation.
 void fill_envelope(onset_group *group, int64_t count, double *env) {
     for (int32_t id = 0; id + 1 < kBeatWorkers; ++id) {
         const group_worker *member = &group->members[id];

@@ -9,37 +9,37 @@
 namespace {
 
 constexpr int64_t kBlock = 5512;        // samples, half a second at 11025 Hz
-constexpr double kUnmeasured = -150.0;  // dB of a block without samples
-constexpr int32_t kTopLevel = 32767;    // levels are 16-bit values
-constexpr int32_t kLevelFloor = 1000;   // -30.31 dB
-constexpr int32_t kDecay = 1000;        // an earlier peak decays by a thousandth per sample
-constexpr int64_t kSumRadius =
-    5;  // a sample's sum covers this many samples before it, and as many starting with it
-constexpr int64_t kChunk = 256;                         // sums computed at once; even
+constexpr double kUnmeasured = -150.0;  // dB, for a block that is not measured
+constexpr int32_t kTopLevel = 32767;    // largest level; levels are 16-bit values
+constexpr int32_t kLevelFloor = 1000;   // -30.31 dB; lower levels are raised to it
+constexpr int32_t kDecay = 1000;        // a peak loses a thousandth of its level per sample
+constexpr int64_t kSumRadius = 5;       // the sum of sample i covers samples i - 5 to i + 4
+constexpr int64_t kChunk = 256;         // sums computed in one step; even
 static_assert(kBlock % 2 == 0 && kSumRadius % 2 == 1);  // every block has an even number of sums
-constexpr int64_t kLookAhead = 8;                       // blocks in the four-second mean
+constexpr int64_t kLookAhead = 8;    // blocks in the mean of the next four seconds
 constexpr int64_t kRiseApart = 7;    // blocks from a rise to the next possible one
-constexpr double kMeanStep = 4.0;    // dB by which the quiet blocks must be below the mean ahead
-constexpr double kLoudMargin = 3.0;  // dB by which the loud part may be below the 60th percentile
+constexpr double kMeanStep = 4.0;    // dB that the quiet blocks must be below the mean ahead
+constexpr double kLoudMargin = 3.0;  // dB that the loud part may be below the 60th percentile
 
-// Block b consists of the samples (b - 1) * kBlock + 1 to b * kBlock; block 1 starts at kSumRadius.
+// The levels of all blocks. Block b consists of the samples (b - 1) * kBlock + 1 to b * kBlock,
+// except that block 1 starts at sample kSumRadius.
 struct block_levels {
     sample_view view;
-    double *db;  // [count + kLookAhead] largest level of each block, or kUnmeasured
+    double *db;  // [count + kLookAhead] largest level of each block in dB, or kUnmeasured
     int64_t count;
 };
 
 struct rise_limits {
-    double p60;
-    double mid;  // between the 40th and the 60th percentile
+    double p60;  // 60th percentile of the block levels
+    double mid;  // halfway between the 40th and the 60th percentile
 };
 
 double level_db(int32_t level) {
     return 20.0 * log10((level < kLevelFloor ? kLevelFloor : level) / kFullScale);
 }
 
-// Sums the ten squares around each of `count` (even) samples, starting at `first`. The order of the
-// additions is fixed. Calls `use` with each pair of sums.
+// Computes the sum of the ten squares around each of `count` samples, starting at `first`, and
+// passes the sums to `use` in pairs. `count` must be even. The order of the additions is fixed.
 template <typename Use>
 void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
     double squares[kChunk + 2 * kSumRadius] = {};
@@ -47,7 +47,7 @@ void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
         const int64_t part = std::min(kChunk, count - done);
         const int64_t used = part + 2 * kSumRadius - 1;
         scale_samples({view.samples + (first + done - kSumRadius), view.full_scale}, used, squares);
-        for (double &square : squares) square *= square;  // a fixed count, so vectorised
+        for (double &square : squares) square *= square;  // the fixed count allows vectorising
         for (int64_t j = 0; j < part; j += 2) {
             const auto two = [p = squares + j](int64_t k) { return load_pair(p + k); };
             const double_pair sum = two(0) + two(1) + two(2) + two(3) + two(4) + two(5) + two(6) +
@@ -64,16 +64,16 @@ int32_t level_of(double sum) {
     return mean < kTopLevel ? static_cast<int32_t>(mean) : kTopLevel;
 }
 
-// The level of a sample: its own or the decayed level of an earlier peak, whichever is larger.
-// *decayed is that decayed level, updated for the next sample.
+// Returns the level of a sample: its own level or the decayed level of an earlier peak, whichever
+// is larger. *decayed holds the latter and is updated for the next sample.
 int32_t follow_level(double sum, int32_t *decayed) {
     const int32_t level = std::max(level_of(sum), *decayed);
     *decayed = level - level / kDecay;
     return level;
 }
 
-// Number of samples until a level has decayed to `bottom`, or below the floor, where it has no
-// effect.
+// Returns the number of samples until a level has decayed to `bottom`, or below kLevelFloor, where
+// it no longer has an effect.
 constexpr int64_t samples_to_decay(int32_t level, int32_t bottom) {
     int64_t count = 0;
     for (; level > bottom && level >= kLevelFloor; level -= level / kDecay) ++count;
@@ -82,7 +82,7 @@ constexpr int64_t samples_to_decay(int32_t level, int32_t bottom) {
 constexpr int64_t kLongestDecay = samples_to_decay(kTopLevel, 0);
 static_assert(kLongestDecay < kBlock - kSumRadius);
 
-// The decayed level at the end of block b, computed from the last `count` samples of the block.
+// Returns the decayed level at the end of block `b`, using the last `count` samples of the block.
 int32_t find_decayed_level(sample_view view, int64_t b, int64_t count) {
     int32_t decayed = 0;
     if (b < 1 || count < 1) return decayed;
@@ -94,8 +94,7 @@ int32_t find_decayed_level(sample_view view, int64_t b, int64_t count) {
     return decayed;
 }
 
-// The largest level of any sample in block b, not counting peaks that decay from the previous
-// block. NaN is ignored.
+// Returns the largest level in block `b`, ignoring NaNs and peaks that decay from the block before.
 int32_t largest_level(sample_view view, int64_t b) {
     const int64_t first = b == 1 ? kSumRadius : (b - 1) * kBlock + 1;
     double_pair most = {0.0, 0.0};
@@ -104,8 +103,8 @@ int32_t largest_level(sample_view view, int64_t b) {
     return level_of(std::max(most[0], most[1]));
 }
 
-// Fills blocks->db. A block's largest level comes from its largest sum or from a decaying peak of
-// the previous block, so only two levels per block are converted to decibels.
+// Fills blocks->db. The largest level of a block comes either from its largest sum or from a peak
+// that decays from the previous block, so each block needs only one conversion to decibels.
 void measure_blocks(block_levels *blocks, int64_t n) {
     std::fill_n(blocks->db, blocks->count + kLookAhead, kUnmeasured);
     int32_t largest_before = 0;
@@ -117,8 +116,9 @@ void measure_blocks(block_levels *blocks, int64_t n) {
     }
 }
 
-// Index of the first sample from (b - 1) * kBlock to b * kBlock whose level reaches `target`, or
-// -1. b is at least 2. The first and the last sample are given the largest level of their block.
+// Returns the first sample from (b - 1) * kBlock to b * kBlock whose level reaches `target`, or -1
+// if none does. `b` is at least 2. The samples at both ends are judged by the largest level of
+// their block instead of their own.
 int64_t find_sample(const block_levels *blocks, int64_t b, double target) {
     const int64_t start = (b - 1) * kBlock;
     if (blocks->db[b - 1] >= target) return start;
@@ -144,8 +144,8 @@ double mean_ahead(const double *db) {
     return sum * 0.125;
 }
 
-// True if a rise starts in the block whose level is db[0]. Never true for an unmeasured block: p60
-// would have to be kUnmeasured too, and then the blocks before it could not be quieter.
+// True if a rise starts in the block whose level is db[0]. An unmeasured block never qualifies: p60
+// would have to be kUnmeasured too, and then no earlier block could be quieter.
 bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     const double step = mean - kMeanStep;
     const double quiet = step < limits->mid ? step : limits->mid;
@@ -153,7 +153,7 @@ bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     return db[-2] < quiet && db[-1] < quiet && mean >= loud && db[0] > loud;
 }
 
-// Writes the sample of each rise, ascending. Returns how many it wrote.
+// Writes the sample where each rise starts, in ascending order. Returns the number of rises.
 int32_t locate_rises(const block_levels *blocks, const rise_limits *limits, int64_t *samples) {
     int32_t count = 0;
     int64_t b = 2;
@@ -169,7 +169,7 @@ int32_t locate_rises(const block_levels *blocks, const rise_limits *limits, int6
     return count;
 }
 
-// sorted: [blocks->count] scratch.
+// Computes the limits from the block levels. `sorted` is scratch memory for blocks->count values.
 rise_limits compute_limits(const block_levels *blocks, double *sorted) {
     for (int64_t b = 0; b < blocks->count; ++b) sorted[b] = blocks->db[b];
     quickSort(0, static_cast<int32_t>(blocks->count - 1), sorted);

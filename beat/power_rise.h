@@ -1,4 +1,4 @@
-// Stage 4, parallel to the onset envelope: finds where the music becomes loud after at least a
+// Stage 4, in parallel with the onset envelope: finds where the music becomes loud after at least a
 // second of relative quiet.
 //
 // Input: the analysis signal. Output: the samples where rises start. Precedes beat/candidates.h.
@@ -9,13 +9,14 @@
 
 extern "C" {
 
-// Sets flags[i] to 1 for each sample i where a rise starts; flags[n] must be zeroed. Returns the
-// number of rises, or TAVO_ERR_MEMORY if memory runs out, with no flag set.
+// Sets flags[i] to 1 for each sample i where a rise starts. flags[n] must be zeroed. Returns the
+// number of rises, or TAVO_ERR_MEMORY, with no flag set, if memory runs out.
 int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n);
 }
 
-// The body of detectPowerVariation for `n` samples. *samples is the ascending list of rises, or
-// null; the caller always frees it. Returns their number, or TAVO_ERR_MEMORY if memory runs out.
+// Implements detectPowerVariation. *samples receives the ascending list of the samples where rises
+// start, or null; the caller always frees it. Returns the number of rises, or TAVO_ERR_MEMORY if
+// memory runs out.
 int32_t find_power_rises(sample_view view, int64_t n, int64_t **samples);
 
 #endif

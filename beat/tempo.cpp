@@ -6,22 +6,22 @@
 
 namespace {
 
-constexpr double kExcerptEnd = 120.0;           // seconds: the excerpt ends here at the latest
-constexpr double kMinute = 60.0;                // seconds: longest excerpt, and the minute in BPM
+constexpr double kExcerptEnd = 120.0;           // seconds, the latest end of the excerpt
+constexpr double kMinute = 60.0;                // seconds, also the length of the longest excerpt
 constexpr double kSlowestBpm = 30.0;            // determines the largest lag
 constexpr double kPreferredBpm = 120.0;         // centre of the weighting
-constexpr double kOctave = 0.6931471805599453;  // ln 2: the width of the weighting
-constexpr double kFasterWins =
-    0.53;  // the shorter period wins above this fraction of the sum of both
-constexpr int32_t kFastestBpm = 200;  // a faster estimate is replaced by kDefaultBpm
+constexpr double kOctave = 0.6931471805599453;  // ln 2, the width of the weighting
+constexpr double kFasterWins = 0.53;            // the shorter period wins above this ratio
+constexpr int32_t kFastestBpm = 200;            // a faster estimate is replaced by kDefaultBpm
 constexpr int32_t kDefaultBpm = 90;
 
 struct period_candidate {
     double score;
-    int32_t lag;  // analysis frames; 0 if there is none
+    int32_t lag;  // period in analysis frames; 0 if nothing was found
 };
 
-// Finds the period that scores best with its double. Scores must exceed 0; on a tie the first wins.
+// Finds the period that scores best together with its double. The score must exceed 0; if several
+// are equal, the shortest period wins.
 period_candidate best_of_two(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 2; ++k) {
@@ -31,7 +31,7 @@ period_candidate best_of_two(const double *r, int32_t lags) {
     return best;
 }
 
-// Finds the period that scores best with its triple.
+// Finds the period that scores best together with its triple.
 period_candidate best_of_three(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 3; ++k) {
@@ -41,7 +41,7 @@ period_candidate best_of_three(const double *r, int32_t lags) {
     return best;
 }
 
-// The beat period in analysis frames; 0 if there is no candidate.
+// Returns the beat period in analysis frames, or 0 if neither search finds one.
 int32_t choose_period(const double *r, int32_t lags) {
     const period_candidate two = lags < 4 ? period_candidate{0.0, 0} : best_of_two(r, lags);
     const period_candidate three = lags < 6 ? period_candidate{0.0, 0} : best_of_three(r, lags);
@@ -53,7 +53,8 @@ int32_t choose_period(const double *r, int32_t lags) {
     return ratio > kFasterWins ? shorter : longer;
 }
 
-// Weights the lags by a Gaussian in octaves around 120 BPM. The weight of lag 0 is 0.
+// Weights the correlation at each lag by a Gaussian around 120 BPM, measured in octaves. The weight
+// of lag 0 is 0.
 void weigh_lags(double *r, int32_t lags, double hop) {
     const double frames_per_minute = kMinute / hop;
     for (int32_t t = 0; t < lags; ++t) {
@@ -62,8 +63,8 @@ void weigh_lags(double *r, int32_t lags, double hop) {
     }
 }
 
-// Replaces the excerpt in re[nfft] with its circular autocorrelation, re[t] for t < lags, which
-// repeats every nfft entries.
+// Replaces the excerpt in re[nfft] with its circular autocorrelation at lags 0 to `lags` - 1, which
+// repeats every `nfft` entries.
 int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32_t lags) {
     if (tavo_dft(re, im, nfft, count, 1) != 0) return TAVO_ERR_MEMORY;
     for (int64_t k = 0; k < nfft; ++k) re[k] = re[k] * re[k] + im[k] * im[k];
@@ -74,15 +75,16 @@ int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32
     return 0;
 }
 
-// The smallest power of two that is at least count.
+// Returns the smallest power of two that is at least `count`.
 int64_t transform_size(int64_t count) {
     int64_t size = 1;
     while (size < count) size *= 2;
     return size;
 }
 
-// The beat period of x[count] in analysis frames, 0 if there is none, or TAVO_ERR_MEMORY. A single
-// NaN, as in silence, would make every correlation NaN, so the transforms are then skipped.
+// Returns the beat period of x[count] in analysis frames, 0 if no period stands out, or
+// TAVO_ERR_MEMORY. A single NaN (from silent input) would make every correlation NaN, so the
+// transforms are then skipped.
 int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, double hop) {
     for (int32_t i = 0; i < count; ++i) {
         if (!std::isfinite(x[i])) return 0;
@@ -110,7 +112,7 @@ int32_t calc_bpm_acf(const double *x, int64_t nfft, int32_t D, int32_t L, double
     const int32_t count = L < nfft ? L : static_cast<int32_t>(nfft);
     const int32_t period = find_period(x, nfft, D, count, hop);
     if (period < 0) return TAVO_ERR_MEMORY;
-    if (period == 0) return kNoPeriodBpm;  // 60 / 0 does not fit an integer
+    if (period == 0) return kNoPeriodBpm;  // avoids dividing by 0
     const double bpm = kMinute / (period * hop);
     return bpm < kNoPeriodBpm ? static_cast<int32_t>(bpm) : kNoPeriodBpm;
 }

@@ -11,7 +11,7 @@ int32_t percentile_index(int32_t count, int32_t percentile) {
     return static_cast<int32_t>(int64_t{count} * percentile / 100);
 }
 
-// Moves sorted[pos] to its sorted position among otherwise ascending values. NaNs (from silent
+// Moves sorted[pos] up to its sorted position among otherwise ascending values. NaNs (from silent
 // input) are left in place.
 void move_up(double *sorted, int32_t pos, int32_t count) {
     const double value = sorted[pos];
@@ -29,16 +29,15 @@ void sort_ascending(double *values, int32_t count) {
     for (int32_t i = 1; i < count; ++i) move_down(values, i);
 }
 
-// The percentile of env[count]. scratch: [count].
+// Returns the 97th percentile (kPercentile) of env[count]. Overwrites scratch[count].
 double percentile_of(const double *env, int32_t count, double *scratch) {
     for (int32_t i = 0; i < count; ++i) scratch[i] = env[i];
     sort_ascending(scratch, count);
     return scratch[percentile_index(count, kPercentile)];
 }
 
-// Slides the sorted window over the worker's range. At index i it holds the W values that start
-// half a window before i. Each step replaces the value that leaves the window with the one
-// that enters.
+// Slides a sorted window over the worker's range. At index i, the window starts half a window
+// length before i. Each step replaces the value that leaves the window with the one that enters it.
 void slide_window(TAVO_THRES_WORKER *worker, double *win) {
     const int32_t size = worker->window;
     const int32_t half = size / 2;
@@ -63,7 +62,7 @@ void slide_window(TAVO_THRES_WORKER *worker, double *win) {
     }
 }
 
-// Computes a worker's range. If memory runs out, it clears the record's thr pointer, which
+// Computes a worker's range of the threshold. If memory runs out, clears the record's `thr`, which
 // run_workers checks.
 void run_thres_worker(void *record) {
     auto *worker = static_cast<TAVO_THRES_WORKER *>(record);
@@ -77,9 +76,9 @@ void run_thres_worker(void *record) {
     free(win);
 }
 
-// Divides the indices that have a full window into four equal ranges, all empty if there are none.
-// Neighbouring ranges would share their boundary index; it belongs to the earlier worker, so that
-// no two threads write the same value.
+// Divides the indices that have a full window into four equal ranges. Without such an index, all
+// ranges are empty. An index on a boundary belongs to the earlier worker only, so that no two
+// threads write the same value.
 void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
                   TAVO_THRES_WORKER *workers, int32_t *done) {
     const int64_t count = beat->frame_count - 1;
@@ -103,7 +102,7 @@ void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
     }
 }
 
-// Fills the middle of thr and raises *top to the largest value there.
+// Fills the middle of `thr` on four threads and raises *top to the largest value written.
 int32_t run_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr, double *top) {
     TAVO_THRES_WORKER workers[kBeatWorkers] = {};
     int32_t done[kBeatWorkers] = {};
@@ -131,8 +130,8 @@ void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
     }
 }
 
-// Fills the part before the first full window with the percentile of a second of values around each
-// index; the first half second stays 0. In a short signal the second is cut off at the end.
+// Fills the part before the first full window: each index gets the percentile of the values in the
+// second around it, and the first half second stays 0. A short signal may cut that second short.
 void fill_head(const TAVO_BEAT_CTX *beat, int32_t window, int32_t second, double *thr,
                double *scratch) {
     const int64_t count = beat->frame_count - 1;
