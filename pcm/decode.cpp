@@ -13,7 +13,7 @@ void decode_segment(void *record) {
     read_pcm(seg->src, seg->buf, seg->cap, &seg->got);
 }
 
-// True if ctx holds a valid decoding plan.
+// True if `ctx` holds a valid decoding plan.
 bool is_planned(const TAVO_CTX *ctx) {
     return ctx->seg != nullptr && ctx->seg_count >= 1 && ctx->seg_count <= kMaxSegments;
 }

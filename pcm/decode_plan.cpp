@@ -12,21 +12,20 @@ pthread_cond_t *ext_cond_mt = nullptr;
 
 namespace {
 
-constexpr int64_t kSingleThreadUnits =
-    50'000'000;  // a stream of up to 5 s is decoded by one thread
+constexpr int64_t kSingleThreadUnits = 50'000'000;  // streams of up to 5 s use one thread
 constexpr int32_t kParallelSegments = 4;
-constexpr int64_t kOverlapUnits = 20'000'000;  // decoded past a segment's end, for the splice
+constexpr int64_t kOverlapUnits = 20'000'000;  // decoded past a segment's end to find the splice
 
 int32_t segments_for(int64_t units) {
     return units > kSingleThreadUnits ? kParallelSegments : 1;
 }
 
-// Number of records in the table. A later plan may use fewer of them.
+// Returns the number of records in the segment table. A later plan may use fewer of them.
 int32_t table_size(const TAVO_CTX *ctx) {
     return std::max(ctx->seg_count, segments_for(ctx->duration));
 }
 
-// Reads format and duration from a source that it opens and closes.
+// Opens a source, reads the format and the duration of the stream from it, and closes it.
 int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     int32_t err = 0;
     mtsrc_ctx *probe = mtsrc_init(open_param, &err);
@@ -41,7 +40,7 @@ int32_t read_stream_format(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     return 0;
 }
 
-// Sets the length of a segment of the current plan, allocates its buffer and seeks its source to
+// Plans one segment: computes the size of its buffer, allocates the buffer and seeks the source to
 // `start`.
 int32_t plan_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_len) {
     TAVO_DECSEG *seg = &ctx->seg[index];
@@ -56,12 +55,12 @@ int32_t plan_segment(TAVO_CTX *ctx, int32_t index, int64_t start, int64_t seg_le
     seg->buf = allocate_buffer(seg->cap);
     if (seg->buf == nullptr) return TAVO_ERR_MEMORY;
 
-    seg->seek_pos = start;  // unchanged if the seek fails without reporting a position
+    seg->seek_pos = start;  // kept if the seek fails without reporting a position
     mtsrc_seekstream(seg->src, start, &seg->seek_pos);
     return 0;
 }
 
-// Allocates the zeroed PCM buffer for units (100 ns) of the stream.
+// Allocates the zeroed PCM buffer for a stream of `units` (100 ns each).
 int32_t allocate_pcm(TAVO_CTX *ctx, int64_t units) {
     int64_t bytes = 0;
     if (!span_bytes(units, ctx->fmt.sample_rate, &bytes)) return TAVO_ERR_MEMORY;
@@ -73,7 +72,7 @@ int32_t allocate_pcm(TAVO_CTX *ctx, int64_t units) {
     return 0;
 }
 
-// Allocates seg_count zeroed records with one shared array of done flags.
+// Allocates and initialises seg_count segment records, which share one array of done flags.
 int32_t allocate_table(TAVO_CTX *ctx, const mtsrc_param *open_param) {
     ctx->seg = zeroed_items<TAVO_DECSEG>(ctx->seg_count);
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
@@ -151,15 +150,15 @@ void tavo_decode_deinit(TAVO_CTX *ctx) {
 }
 
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start) {
-    // The caller has freed these buffers. The pointers are cleared before anything can fail, so
-    // that no release frees them again.
+    // The caller has freed these buffers. Clear the pointers before anything can fail, so that the
+    // buffers are not freed again.
     ctx->pcm = nullptr;
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;
     for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].buf = nullptr;
 
     int64_t rest = 0;
     if (__builtin_sub_overflow(ctx->duration, start, &rest) || rest < 0) return TAVO_ERR_MEMORY;
-    // If start is below 0, the rest may need more segments than the table has records.
+    // If `start` is negative, the rest may need more segments than the table has records.
     ctx->seg_count = std::min(segments_for(rest), table_size(ctx));
     const int64_t seg_len = rest / ctx->seg_count;
     int32_t err = 0;

@@ -1,32 +1,33 @@
 // Stage 2a: plans the decoding.
 //
-// Input: a path, or a start in the stream. Output: the segments, each with an open source and a
-// buffer, and one zeroed PCM buffer. Follows media_source/mtsrc.h; precedes pcm/decode.h.
+// Input: a path, or a start position in the stream. Output: the segments, each with an open source
+// and a buffer, and one zeroed PCM buffer for all of them. Follows media_source/mtsrc.h and
+// precedes pcm/decode.h.
 //
-// The stream is cut into 1 or 4 segments, each with its own media source, buffer and thread. All
-// but the last decode two seconds past their end.
+// The stream is divided into one or four segments, each with its own media source, buffer and
+// thread. Each segment except the last is decoded two seconds past its end.
 #ifndef TAVO_PCM_DECODE_PLAN_H
 #define TAVO_PCM_DECODE_PLAN_H
 
 #include "common/tavo_ctx.h"
 #include "media_source/mtsrc.h"
 
-// One decoding segment. A thread uses only its own record, buffer and source, except for done,
-// which is shared and guarded by the mutex.
+// One decoding segment. A thread uses only its own record, buffer and source. Only the done flags
+// are shared; the mutex guards them.
 struct TAVO_DECSEG {
-    int32_t index;  // from 0, also its index in done
+    int32_t index;  // from 0, also the segment's index in done
     pthread_t thread;
     mtsrc_ctx *src;          // owned; stays open until the table is released
-    mtsrc_param open_param;  // path is read only during set-up
+    mtsrc_param open_param;  // its path is read during set-up only
     TAVO_FMT fmt;
-    int64_t duration;        // of the stream, 100-ns units
+    int64_t duration;        // duration of the stream, 100-ns units
     uint8_t *buf;            // [cap] PCM bytes, owned
     int64_t cap;             // bytes
     int64_t got;             // bytes decoded into buf
     int64_t start;           // 100-ns units from the start of the stream
     int64_t seek_pos;        // position that the seek reported, 100-ns units
-    int32_t *done;           // [seg_count] one array for all segments, owned by the table
-    int32_t count;           // segments of the plan
+    int32_t *done;           // [count] one array for all segments, owned by the table
+    int32_t count;           // number of segments in the plan
     pthread_mutex_t *mutex;  // ext_mutex_mt
     pthread_cond_t *cond;    // ext_cond_mt
 };
@@ -37,24 +38,25 @@ static_assert(sizeof(void *) != 8 ||
 
 extern "C" {
 
-// Lock and condition of the decoding threads, from tavo_decode_init to tavo_decode_deinit;
-// otherwise null.
+// The lock and condition of the decoding threads. They exist from tavo_decode_init to
+// tavo_decode_deinit and are null otherwise.
 extern pthread_mutex_t *ext_mutex_mt;
 extern pthread_cond_t *ext_cond_mt;
 
-// Plans the decoding of the file: fills fmt, duration, seg, seg_count, pcm, pcm_bytes. Returns 0;
-// TAVO_ERR_MEMORY; TAVO_ERR_FORMAT if the file is unusable, at most 1 s long or below 8000 Hz;
-// TAVO_ERR_HANDLE if it cannot be opened; or the code of a segment's source. On failure it releases
-// everything.
+// Plans the decoding of the file: fills fmt, duration, seg, seg_count, pcm and pcm_bytes. Returns
+// 0; TAVO_ERR_MEMORY; TAVO_ERR_FORMAT if the stream is unusable, lasts 1 s or less, or has a rate
+// below 8000 Hz; TAVO_ERR_HANDLE if the file cannot be opened; or the error code of a segment's
+// source. On failure, releases everything.
 int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param);
 
 // Releases the segment table with its sources and buffers, the PCM buffer, the lock and the
 // condition. Accepts a partly built plan and may be called twice.
 void tavo_decode_deinit(TAVO_CTX *ctx);
 
-// Plans the decoding from `start` (100-ns units) to the end of the stream with the open sources.
-// Allocates new segment buffers and a new pcm; the caller must have freed the old ones. Returns 0,
-// or TAVO_ERR_MEMORY with the segment buffers freed if memory runs out or nothing is left.
+// Plans the decoding from `start` (100-ns units) to the end of the stream, using the sources that
+// are already open. Allocates new segment buffers and a new pcm; the caller must have freed the old
+// ones. Returns 0, or TAVO_ERR_MEMORY, with the segment buffers freed, if memory runs out or
+// nothing is left to decode.
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
 }
 

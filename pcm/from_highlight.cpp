@@ -11,11 +11,11 @@
 
 namespace {
 
-constexpr int64_t kFirstSeekMs = 1001;  // an earlier highlight counts as the start of the file
+constexpr int64_t kFirstSeekMs = 1001;  // any earlier highlight counts as the start of the file
 constexpr float kMsPerSecond = 1000.0f;
 
-// The probe is PCM decoded from the seek position. Its block starts late enough for a decoder to
-// have settled after the seek.
+// The probe is PCM decoded from the seek position. The block to search for starts late enough in it
+// for a decoder to have settled after the seek.
 constexpr int64_t kProbeBytes = 8192;
 constexpr int64_t kProbeBlockOffset = 4608;
 
@@ -23,29 +23,30 @@ constexpr int64_t kProbeBlockOffset = 4608;
 constexpr int64_t kSecondsBefore = 1;
 constexpr int64_t kSecondsAfter = 3;
 
-constexpr int64_t kUnknownBytes = INT64_MAX;  // no record states the size of the PCM buffer
+constexpr int64_t kUnknownBytes = INT64_MAX;  // the size of the PCM buffer is not known
 
-// Range of offsets to test for the probe's block in PCM of pcm_bytes bytes. expected: the expected
-// byte offset of the seek position.
+// Returns the range of offsets at which to look for the probe's block in pcm_bytes bytes of PCM.
+// `expected` is the expected byte offset of the seek position.
 offset_range search_range(int64_t expected, int32_t rate, int64_t pcm_bytes) {
     const int64_t second = std::max<int64_t>(second_bytes(rate), 0);
     const int64_t before = second * kSecondsBefore;
     const int64_t after = second * kSecondsAfter;
-    // The seek position must not be before the start of the buffer. None of these sums can
-    // overflow.
+    // With a lower offset, the seek position would be before the start of the buffer. None of these
+    // sums can overflow.
     const int64_t first =
         expected < before + kProbeBlockOffset ? kProbeBlockOffset : expected - before;
     const int64_t end = expected > pcm_bytes - after ? pcm_bytes : expected + after;
     return {first, std::min(end, pcm_bytes - kBlockBytes + 1)};
 }
 
-// Finds in `pcm` the audio that the source delivers next. *off is its expected byte offset on entry
-// and the offset found on return. Returns 0 if found; -1 if not, with *off unchanged.
+// Looks in `pcm` for the audio that the source delivers next. On entry, *off is the byte offset
+// where it is expected. Returns 0 and sets *off to the offset found; if it is not found, returns -1
+// and leaves *off unchanged.
 int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_t pcm_bytes,
                         int64_t *off) {
     auto *probe = static_cast<uint8_t *>(malloc(kProbeBytes));
     if (probe == nullptr) {
-        mark_incomplete();  // the second decoding may give other beats
+        mark_incomplete();  // a second decoding may lead to different beats
         return -1;
     }
 
@@ -62,7 +63,7 @@ int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_
     return 0;
 }
 
-// Size in bytes of the buffer that was planned from the segment's start to the end of the stream.
+// Returns the size in bytes of a buffer planned from the segment's start to the end of the stream.
 int64_t planned_bytes(const TAVO_DECSEG *seg) {
     if (seg->duration == 0) return kUnknownBytes;
     int64_t units = 0;
@@ -86,8 +87,9 @@ int32_t decode_again(TAVO_CTX *ctx, int64_t start, segment_pages pages) {
     return 0;
 }
 
-// Seeks to `pos` (milliseconds) and stores the position reached as the highlight. Finds it in the
-// decoded PCM, or decodes again from there. *off: bytes of `pcm` before that position.
+// Seeks to `pos` (milliseconds) and stores the position that was reached as the highlight. If the
+// position cannot be found in the decoded PCM, decodes again from there. *off receives the number
+// of bytes of `pcm` before the position.
 int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t *off) {
     mtsrc_ctx *src = ctx->seg[0].src;
     const int32_t rate = ctx->fmt.sample_rate;
@@ -97,7 +99,8 @@ int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t 
     mtsrc_seekstream(src, reached, &reached);
     ctx->hl->hl_pos = static_cast<uint32_t>(reached / kUnitsPerMs);
 
-    // Single precision on purpose, in this order: its rounding is part of the result.
+    // Computed in single precision and in this order on purpose: the rounding is part of the
+    // result.
     const float seconds = static_cast<float>(ctx->hl->hl_pos) / kMsPerSecond;
     *off = static_cast<int64_t>(seconds * 2.0f * static_cast<float>(rate));
     if (find_next_audio(src, rate, ctx->pcm, ctx->pcm_bytes, off) == 0) return 0;
@@ -106,12 +109,12 @@ int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t 
     return decode_again(ctx, reached, pages);
 }
 
-// Converts `pcm`, skipping its first `off` bytes, and frees it.
+// Converts the PCM after its first `off` bytes to the analysis signal, and frees the PCM.
 int32_t convert_rest(TAVO_CTX *ctx, int64_t off) {
     int16_t *pcm = ctx->pcm;
     const int64_t bytes = pcm == nullptr ? 0 : std::max<int64_t>(ctx->pcm_bytes - off, 0);
     ctx->pcm = nullptr;
-    // Moves the samples to the start of the buffer, because off may be odd.
+    // Move the samples to the start of the buffer, because `off` may be odd.
     if (off > 0 && bytes > 0) {
         memmove(pcm, reinterpret_cast<const uint8_t *>(pcm) + off, static_cast<size_t>(bytes));
     }

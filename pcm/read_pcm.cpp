@@ -9,7 +9,7 @@ namespace {
 // Consecutive empty reads before giving up; far more than any real stream produces.
 constexpr int32_t kMaxEmptyReads = 65'536;
 
-// Other codes are informational; the byte count is what matters.
+// True if the read failed. Other codes are informational; the byte count is what matters.
 bool is_failure(int32_t result) {
     return result == TAVO_ERR_MEMORY || result == TAVO_ERR_HANDLE || result == TAVO_ERR_READ;
 }

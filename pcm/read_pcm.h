@@ -1,17 +1,18 @@
 // Reads a media source until a buffer is full.
 //
-// Input: a positioned source. Output: 16-bit mono PCM, bytes. Called by pcm/decode.cpp for a
-// segment and by pcm/from_highlight.cpp for the probe at a highlight.
+// Input: a media source that has been positioned. Output: bytes of 16-bit mono PCM. Called by
+// pcm/decode.cpp to decode a segment and by pcm/from_highlight.cpp to decode the probe at a
+// highlight.
 #ifndef TAVO_PCM_READ_PCM_H
 #define TAVO_PCM_READ_PCM_H
 
 #include "media_source/mtsrc.h"
 
-constexpr int64_t kReadBytes = 8192;  // largest single read
+constexpr int64_t kReadBytes = 8192;  // size of the largest single read
 
-// Fills dst from the source's position until it holds capacity bytes, the stream ends or the source
-// fails. *got is the number of bytes so far, updated after each read. The bytes of a failed read do
-// not count.
+// Reads from the source's position until `dst` holds `capacity` bytes, the stream ends or the
+// source fails. *got is the number of bytes so far, updated after each read. The bytes of a failed
+// read do not count.
 void read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity, int64_t *got);
 
 #endif

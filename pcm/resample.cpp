@@ -15,13 +15,13 @@ constexpr int64_t kTailBytes = 64;  // zero bytes after the last output
 struct conversion {
     int64_t count;
     int64_t n;
-    int64_t size;  // bytes of the output buffer
+    int64_t size;  // size of the output buffer in bytes
     int32_t source_rate;
     int32_t ana_rate;
     float ratio;
 };
 
-// Returns false if the sizes or rates give no valid length.
+// Computes the sizes of a conversion. Returns false if a rate is not valid or a size overflows.
 bool plan_conversion(int64_t bytes, int32_t source_rate, int32_t ana_rate, conversion *plan) {
     plan->count = std::max<int64_t>(bytes, 0) / kBytesPerSample;
     plan->source_rate = source_rate;
@@ -48,8 +48,8 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
     if (ready) {
         advise_huge_pages(narrow, plan.n * kBytesPerSample);
         if (dorn_resampler_prepare(state, plan.source_rate, plan.ana_rate, 1) == 0) {
-            // The converter counts its input in 32 bits. The output for later input
-            // (after 12 hours at 48 kHz) stays 0.
+            // The interpolator counts its input in 32 bits. Input past that limit (12 hours at 48
+            // kHz) is ignored, and the output for it stays 0.
             const auto in_len = static_cast<int32_t>(std::min<int64_t>(plan.count, INT32_MAX));
             convert_frames(state, in, in_len, narrow, plan.n);
         }
@@ -60,16 +60,16 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
     return ready ? 0 : TAVO_ERR_MEMORY;
 }
 
-// True if the output may overwrite the input. The interpolator has read all input before it writes,
-// and at ratio 4 the samples of one output take as many bytes as the output.
+// True if the output may overwrite the input. The interpolator reads all of its input before the
+// output is written. At ratio 4, the samples of a block take as many bytes as their mean.
 bool works_in_place(const conversion &plan) {
     const int32_t whole = whole_ratio(plan.ratio);
     return plan.n > 0 && (whole == 0 || whole == kMaxWholeRatio);
 }
 
-// Returns a heap block large enough for the output. If *owned is not null and the conversion works
-// in place, this is *owned, which may be enlarged and moved; otherwise it is new and zeroed. Null
-// if memory runs out.
+// Returns a heap block that is large enough for the output, or null if memory runs out. If *owned
+// is not null and the conversion works in place, this is *owned, which may be enlarged and moved.
+// Otherwise it is new and zeroed.
 double *allocate_output(const conversion &plan, int16_t **owned) {
     void *memory = nullptr;
     if (*owned != nullptr && works_in_place(plan)) {
@@ -91,7 +91,8 @@ double *shrink_output(const conversion &plan, double *out) {
     return smaller == nullptr ? out : static_cast<double *>(smaller);
 }
 
-// Converts pcm. owned: pcm if this function frees it or reuses its memory; otherwise null.
+// Converts `pcm`. `owned` is `pcm` if this function must free the memory or reuse it for the
+// output, otherwise null.
 int32_t convert(const int16_t *pcm, int16_t *owned, int64_t bytes, int32_t source_rate,
                 int32_t ana_rate, int64_t *out_len, double **out) {
     *out_len = 0;

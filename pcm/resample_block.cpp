@@ -13,16 +13,16 @@ pthread_cond_t *ext_cond_resample = nullptr;
 namespace {
 
 constexpr int32_t kParts = 4;
-constexpr int32_t kExactFloats = 1 << 24;  // floats represent whole numbers exactly up to here
+constexpr int32_t kExactFloats = 1 << 24;  // a float holds any whole number up to here
 
-// Number of outputs whose block has exactly `whole` samples. Later positions are rounded in single
-// precision.
+// Returns the number of outputs whose blocks have exactly `whole` samples. After them, positions
+// are rounded in single precision.
 int64_t exact_blocks(int32_t whole) {
     return whole == 3 ? kExactFloats / 3 : kExactFloats;
 }
 
-// First input sample of output i, at most `count`. Single precision on purpose: its rounding
-// determines the blocks of long signals.
+// Returns the first input sample of output `i`, at most `count`. Computed in single precision on
+// purpose: the rounding determines the blocks of long signals.
 int64_t block_start(float ratio, int64_t i, int64_t count) {
     const float position = ratio * static_cast<float>(i);
     const bool inside = static_cast<double>(position) < static_cast<double>(count);
@@ -35,8 +35,8 @@ double block_mean(const int16_t *in, int64_t first, int64_t end) {
     return static_cast<double>(sum / static_cast<float>(end - first));
 }
 
-// Averages blocks of any length for outputs `first` to `end` - 1. in[0] is sample number `base` of
-// the `count` samples.
+// Computes outputs `first` to `end` - 1 from blocks of any length. in[0] is sample number `base` of
+// the `count` input samples.
 void average_blocks(float ratio, const int16_t *in, int64_t base, int64_t count, double *out,
                     int64_t first, int64_t end) {
     for (int64_t i = first; i < end; ++i) {
@@ -51,11 +51,11 @@ void average_blocks(float ratio, const int16_t *in, int64_t base, int64_t count,
 }
 
 // Averages blocks of exactly kWhole samples. Their sums are exact in single precision, so integer
-// sums give the same result. If kWhole is 4, in and out may be the same memory, because each step
-// is read before it is written.
+// sums give the same result. If kWhole is 4, `in` and `out` may be the same memory, because each
+// step reads its input before it writes.
 template <int32_t kWhole>
 void average_whole(const int16_t *in, double *out, int64_t first, int64_t end) {
-    constexpr int32_t kStep = 64;  // outputs
+    constexpr int32_t kStep = 64;  // outputs per step
     int16_t block[kStep * kWhole];
     while (first < end) {
         const auto outputs = static_cast<int32_t>(std::min<int64_t>(end - first, kStep));
@@ -70,7 +70,7 @@ void average_whole(const int16_t *in, double *out, int64_t first, int64_t end) {
     }
 }
 
-// Averages blocks of four samples, four outputs side by side.
+// Averages blocks of four samples and computes four outputs at once.
 void average_fours(const int16_t *in, double *out, int64_t first, int64_t end) {
     for (; first + 4 <= end; first += 4) {
         int_quad a;  // two samples in each lane
@@ -104,10 +104,10 @@ void average_part(void *record) {
     average_blocks(part->ratio, part->in, 0, part->in_count, part->out, exact, part->end);
 }
 
-// Computes outputs exact_blocks(4) to n - 1 at ratio 4 in place. The samples of a block may be
-// overwritten by an earlier output, so they are read ahead.
+// Computes outputs exact_blocks(4) to n - 1 in place at ratio 4. An output may overwrite the
+// samples of a later block, so each step copies its samples first.
 void average_rounded_in_place(const int16_t *in, int64_t count, double *out, int64_t n) {
-    // Outputs per step. The position of a step's first output is exact in songs of up to 72 days,
+    // Outputs per step. In songs of up to 72 days, the position of a step's first output is exact,
     // so a block extends at most one sample into the next step.
     constexpr int64_t kStep = 4096;
     int16_t window[4 * kStep + 1];

@@ -13,14 +13,14 @@ constexpr int32_t kTapsOther = 19;
 constexpr double kWholeRatio = 0.0001;
 constexpr double kEdgeDown = 0.9;        // cut-off relative to the output's Nyquist frequency
 constexpr double kEdgeUp = 0.99;         // upper limit relative to the input's Nyquist frequency
-constexpr double kCentre = 1e-9;         // any closer to its centre, the sinc is set to its limit
+constexpr double kCentre = 1e-9;         // closer to its centre, the sinc takes its limit value
 constexpr double kPhaseSteps = 960.0;    // phases per input sample
-constexpr double kMiddlePhase = 480.0;   // the phase with no fractional offset
-constexpr double kFracLimit = 0.500001;  // half a sample plus rounding
-constexpr float kRatioLimit = 2147483648.0f;  // no pair of rates reaches it
+constexpr double kMiddlePhase = 480.0;   // the phase whose fractional offset is 0
+constexpr double kFracLimit = 0.500001;  // half a sample, with a margin for rounding
+constexpr float kRatioLimit = 2147483648.0f;  // far above the ratio of any real rates
 
-// Coefficient of tap k for the fractional offset f and the cut-off wc. The mix of single and double
-// precision is part of the result.
+// Returns the coefficient of tap `k` for the fractional offset `f` and the cut-off `wc`. The mix of
+// single and double precision is part of the result.
 float tap_coefficient(int32_t taps, int32_t k, float f, float wc) {
     const auto span = static_cast<float>(taps);
     const float t = std::clamp(static_cast<float>(k) - f, 0.0f, span);
@@ -36,7 +36,7 @@ float tap_coefficient(int32_t taps, int32_t k, float f, float wc) {
     return static_cast<float>(sinc * static_cast<double>(w));
 }
 
-// Input of one output frame: input frames `first` to `first` + taps, weighted by `row`.
+// The input of one output frame: input frames `first` to `first` + taps, weighted by `row`.
 struct frame_input {
     int64_t first;
     const float *row;
@@ -88,7 +88,7 @@ int16_t wrap_sample(float sum) {
     const double value = static_cast<double>(sum) + 0.5;
     if (!(std::fabs(value) < kInt64Limit)) return 0;
     auto rounded = static_cast<int64_t>(value);
-    rounded -= static_cast<double>(rounded) > value ? 1 : 0;  // toward minus infinity
+    rounded -= static_cast<double>(rounded) > value ? 1 : 0;  // round toward minus infinity
     return static_cast<int16_t>(static_cast<uint16_t>(rounded));
 }
 

@@ -4,9 +4,9 @@
 
 namespace {
 
-constexpr float kSmallFloat = 1073741824.0f;  // 2^30: rounding it up still fits an int32_t
+constexpr float kSmallFloat = 1073741824.0f;  // 2^30; rounded values below it fit an int32_t
 
-// Converts four taps of one output frame to floats and weights them.
+// Converts four input samples of one output frame to floats and multiplies them by their weights.
 float_quad weigh_taps(const float *row, const int16_t *in) {
     int64_t four = 0;
     memcpy(&four, in, sizeof four);
@@ -24,12 +24,12 @@ bool any_lane(int_quad mask) {
     return (halves[0] | halves[1]) != 0;
 }
 
-// wrap_sample of four sums. Returns false and writes nothing if any of them is too large.
+// Applies wrap_sample to four sums. Returns false and writes nothing if any of them is too large.
 bool wrap_quad(float_quad acc, int16_t *out) {
     if (any_lane(~((acc > -kSmallFloat) & (acc < kSmallFloat)))) return false;
     int_quad rounded = __builtin_convertvector(acc, int_quad);
     const float_quad rest = acc - __builtin_convertvector(rounded, float_quad);
-    rounded += (rest < -0.5f) - (rest >= 0.5f);  // a true comparison is -1
+    rounded += (rest < -0.5f) - (rest >= 0.5f);  // in a vector, true is -1
     const auto halves = reinterpret_cast<int16_octet>(rounded);
     const auto low = reinterpret_cast<int64_pair>(
         __builtin_shufflevector(halves, halves, 0, 2, 4, 6, 0, 2, 4, 6));
@@ -38,8 +38,9 @@ bool wrap_quad(float_quad acc, int16_t *out) {
     return true;
 }
 
-// The sums of four frames. A lane adds the taps of its frame in their order, as filter_frame does.
-// The taps of a frame are neighbours in memory, so each step of four taps is transposed:
+// Computes the sums of four output frames, one in each lane. A lane adds the taps of its frame in
+// the same order as filter_frame. The taps of a frame are adjacent in memory, so each step of four
+// taps is transposed:
 //
 //      loaded             interleaved              added to acc in turn
 //   a  a0 a1 a2 a3   ab_low   a0 b0 a1 b1   tap 0  a0 b0 c0 d0
@@ -72,8 +73,8 @@ float_quad sum_quad(int32_t taps, const float *const *row, const int16_t *const 
     return acc;
 }
 
-// Finds the first input sample and the phase of output frames j to j + 3, as find_input does for
-// one frame. Returns false if an output frame needs samples outside the input or its phase may be
+// Finds the first input sample and the phase of output frames `j` to `j` + 3, as find_input does
+// for one frame. Returns false if a frame needs samples outside the input or if its phase may be
 // out of range.
 bool find_inputs(const dorn_resampler_state &state, int64_t j, int32_t in_len, int_quad *first,
                  int_quad *phase) {
@@ -91,8 +92,8 @@ bool find_inputs(const dorn_resampler_state &state, int64_t j, int32_t in_len, i
     if ((*first)[0] < 1 || (*first)[3] + state.taps >= in_len) return false;
     if (static_cast<double>(half + whole[3]) >= static_cast<double>(in_len)) return false;
 
-    // Positions of 1 and more have at most 23 fractional bits. The differences are therefore exact,
-    // and so is floor(960 * frac + 480.5) in units of 2^-17.
+    // Positions of 1 and more have at most 23 fractional bits, so the differences are exact. So is
+    // the phase, floor(960 * frac + 480.5), which is computed in units of 2^-17.
     const float_quad frac = pos - whole - (state.taps % 2 != 0 ? 0.5f : 0.0f);
     if (any_lane(frac > 0.5f)) return false;
     const int_quad bits = __builtin_convertvector(frac * 8388608.0f, int_quad);

@@ -7,21 +7,21 @@
 
 namespace {
 
-// Bytes copied before their pages are released. Chunks end at the boundaries of huge pages.
+// Bytes to copy before their pages are released. Chunks end at huge-page boundaries.
 constexpr int64_t kChunkBytes = 2 << 20;
 
-// Offset in dst[total] at which the segment's data begins: the last offset above 0 where its first
-// block occurs, or `total`.
+// Returns the offset in dst[total] at which the segment's data belongs: the last offset above 0
+// where its first block occurs, or `total` if the block does not occur.
 int64_t find_splice(const uint8_t *dst, int64_t total, const uint8_t *data, int64_t avail) {
     if (avail < kBlockBytes) return total;
     const int64_t splice = find_highest(dst, {1, total - kBlockBytes + 1}, data);
     return splice == kNotFound ? total : splice;
 }
 
-// Copies `bytes` bytes from `data`, which is in the segment's buffer, and releases each chunk after
-// copying it, so that only one chunk is in memory twice.
+// Copies `bytes` bytes from `data`, which points into the segment's buffer. Releases each chunk
+// after copying it, so that only one chunk is in memory twice.
 void move_pages(const TAVO_DECSEG *seg, uint8_t *dst, const uint8_t *data, int64_t bytes) {
-    const uint8_t *done = seg->buf;  // everything before is released
+    const uint8_t *done = seg->buf;  // everything before this is released
     int64_t at = 0;
     while (at < bytes) {
         const auto in_chunk =

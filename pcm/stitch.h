@@ -1,6 +1,6 @@
 // Joins the decoded segments into one signal.
 //
-// Input: segments with their buffers, 16-bit mono PCM. Output: one buffer of PCM. Called by
+// Input: the segments, whose buffers hold 16-bit mono PCM. Output: one buffer of PCM. Called by
 // pcm/decode.cpp. Precedes highlight/position.h and pcm/resample.h.
 #ifndef TAVO_PCM_STITCH_H
 #define TAVO_PCM_STITCH_H
@@ -10,24 +10,25 @@
 
 extern "C" {
 
-// dst[i] = (left + right) / 2 of sample frame i of interleaved stereo, rounded toward zero. For
-// direct calls only.
+// Downmixes interleaved stereo: every output sample is the mean of left and right, rounded toward
+// zero. Exported for direct callers; the library does not use it.
 void stereo2mono(int16_t *dst, const int16_t *src, int32_t frames);
 }
 
-// What happens to a segment's buffer once it is stitched. It stays allocated in any case. kept:
-// unchanged. released: the pages of a large buffer go back to the system, and it reads as zeros.
+// Selects what happens to a segment's buffer once it is stitched. `kept` leaves the buffer
+// unchanged. `released` gives the pages of a large buffer back to the system; the buffer stays
+// allocated and reads as zeros.
 enum class segment_pages { kept, released };
 
-// Bytes of one second of PCM. Every segment but the first drops its first second, because a decoder
-// may need that long to settle after a seek.
+// Returns the number of bytes in one second of PCM. Every segment except the first drops its first
+// second, because a decoder may need that long to settle after a seek.
 inline int64_t second_bytes(int32_t rate) {
     return rate * kBytesPerSample;
 }
 
-// Copies the `count` decoded segments to dst (capacity bytes). Each is placed where the output
-// already has the same bytes, or at the end of the output. Returns the number of bytes written; 0
-// if any segment is empty.
+// Copies the `count` decoded segments to `dst`, which has `capacity` bytes. Each segment is placed
+// where the output already has the same bytes, or else at the end of the output. Returns the number
+// of bytes written, or 0 if any segment is empty.
 int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
                         int64_t capacity, segment_pages pages);
 
