@@ -9,10 +9,9 @@
 
 namespace {
 
-constexpr int64_t kMaxCopy =
-    INT64_MAX / 32;  // values; the byte size of two copies does not overflow
+constexpr int64_t kMaxCopy = INT64_MAX / 32;  // values; keeps the size of two arrays in range
 
-// Two arrays of doubles in one allocation.
+// The real and imaginary parts, in one allocation.
 struct complex_copy {
     double *re;
     double *im;
@@ -34,8 +33,8 @@ bool copy_input(complex_copy *copy, const double *re, const double *im, int64_t 
 }
 
 // True if the fast transform is exact enough for the input. It would spread an infinite or NaN
-// value over all outputs, and its intermediate values could overflow; such input is summed term by
-// term.
+// value to all outputs, and very large values could overflow inside it. Such input is summed term
+// by term instead.
 bool is_fit_for_fft(const complex_copy &x, int64_t used, int64_t n) {
     if (!is_fft_size(n)) return false;
     double l1_norm = 0.0;
@@ -53,7 +52,7 @@ bool transform_fast(double *re, double *im, int64_t n) {
     return true;
 }
 
-// Skips the inputs at index `used` and above, which are zero.
+// Computes the forward transform term by term. Skips the inputs from `used` on, which are zero.
 void forward_sums(double *re, double *im, int64_t n, const complex_copy &x, int64_t used,
                   bool real_input) {
     for (int64_t k = 0; k < n; ++k) {
@@ -111,7 +110,7 @@ int32_t tavo_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_inpu
     if (n <= 0) return 0;
     const bool real = real_input != 0;
     const int64_t used = clamp_count(m, n);
-    const bool small = n <= kMaxFftSize;  // the fast transform runs inside the copy
+    const bool small = n <= kMaxFftSize;  // the fast transform works in place on the copy
     complex_copy x;
     if (!copy_input(&x, re, real ? nullptr : im, used, small ? n : used)) return TAVO_ERR_MEMORY;
     if (is_fit_for_fft(x, used, n) && transform_fast(x.re, x.im, n)) {

@@ -26,7 +26,7 @@ bool has_tables(const TAVO_FFT_CTX *ctx, int32_t n) {
     return ctx->cos_table != nullptr && n == 1 << ctx->stages;
 }
 
-// Each swap is listed once, at its lower index; all other entries are 0.
+// Lists each swap once, at its lower index; all other entries are 0.
 void fill_bit_reverse(TAVO_FFT_CTX *ctx, int32_t n) {
     const auto bits = static_cast<uint32_t>(ctx->stages);
     for (uint32_t i = 0; i < static_cast<uint32_t>(n); ++i) {
@@ -73,7 +73,7 @@ inline complex<double> twiddle(const TAVO_FFT_CTX *ctx, size_t k) {
     return {ctx->cos_table[k], ctx->sin_table[k]};
 }
 
-// top becomes top + w * bottom, bottom becomes top - w * bottom.
+// Replaces `top` with top + w * bottom, and `bottom` with top - w * bottom.
 template <typename T>
 inline void butterfly(complex<T> *top, complex<T> *bottom, complex<double> w) {
     const complex<T> t = {bottom->re * w.re - bottom->im * w.im,
@@ -97,11 +97,11 @@ void run_stage(const spectrum<T> &x, size_t half, size_t size, const TAVO_FFT_CT
     }
 }
 
-// Runs a stage and the next one on four elements at a time, which stay in registers between the
-// stages. half: distance of the two inputs of a butterfly in the first of the stages.
+// Runs two consecutive stages on four elements at a time, which stay in registers in between.
+// `half` is the distance between the two inputs of a butterfly in the first stage.
 template <typename T>
 void run_two_stages(const spectrum<T> &x, size_t half, size_t size, const TAVO_FFT_CTX *ctx) {
-    const size_t stride = size / (4 * half);  // of the second stage's twiddle factors
+    const size_t stride = size / (4 * half);  // step between the second stage's twiddle factors
     for (size_t j = 0; j < half; ++j) {
         const complex<double> w0 = twiddle(ctx, 2 * stride * j);
         const complex<double> w1 = twiddle(ctx, stride * j);
@@ -135,7 +135,7 @@ void run_stages(const spectrum<T> &x, size_t half, size_t end, size_t size,
     for (; half < end; half *= 4) run_two_stages(x, half, size, ctx);
 }
 
-// Radix 2, decimation in time.
+// Runs a radix-2 transform with decimation in time.
 template <typename T>
 void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
     if (!has_tables(ctx, n)) return;
@@ -144,7 +144,7 @@ void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
     run_stages<T>({re, im}, 1, size, size, ctx);
 }
 
-// The outputs of a butterfly of two real values.
+// The outputs of a butterfly whose inputs are real.
 struct real_pair {
     complex<double_pair> sum;
     complex<double_pair> difference;
@@ -162,7 +162,7 @@ inline double_pair windowed(const frame_pair &frames, size_t i) {
 constexpr size_t kFirstGroup = 8;  // elements that the first three stages combine
 
 // Runs the first three stages on the eight windowed samples at i, i + step, ..., i + 7 * step and
-// stores the results in x, starting at x[first]. Skips multiplications by 1 and by zero imaginary
+// stores the results in `x` from index `first` on. Skips multiplications by 1 and by zero imaginary
 // parts; if the results are finite, this changes only the sign of zeros.
 inline void start_group(const frame_pair &frames, size_t i, size_t step, size_t first,
                         const spectrum<double_pair> &x, const TAVO_FFT_CTX *ctx) {
@@ -196,7 +196,8 @@ inline void start_group(const frame_pair &frames, size_t i, size_t step, size_t 
     store(x, first + 7, high.difference);
 }
 
-// Counts in bit-reversed order: returns the successor of x among the numbers below limit.
+// Returns the number that follows `x` when the numbers below `limit` are counted in bit-reversed
+// order.
 size_t next_reversed(size_t x, size_t limit) {
     size_t bit = limit / 2;
     for (; (x & bit) != 0; bit /= 2) x -= bit;
@@ -208,8 +209,8 @@ inline double_pair power_of(const complex<double_pair> &x) {
     return __builtin_convertvector(__builtin_convertvector(power, float_pair), double_pair);
 }
 
-// Runs the last two stages, computing only the powers of the bins below size / 2. Returns the sum
-// of these powers.
+// Runs the last two stages, but computes only the powers of the bins below size / 2. Returns the
+// sum of these powers.
 double_pair finish_powers(const spectrum<double_pair> &x, size_t size, const TAVO_FFT_CTX *ctx,
                           double_pair *powers) {
     const size_t half = size / 4;

@@ -2,7 +2,7 @@
 
 namespace {
 
-// Adds weight * row to out[cols], skipping zeros in row.
+// Adds the row, multiplied by `weight`, to out[cols]. Skips zeros in the row.
 void add_row(double weight, const float *row, int32_t cols, double *out) {
     for (int32_t j = 0; j < cols; ++j) {
         if (row[j] != 0.0f) out[j] += weight * static_cast<double>(row[j]);

@@ -1,4 +1,4 @@
-// Product of two matrices of row pointers. Caller: beat/onset_envelope.h, spectra times mel bands.
+// Multiplies matrices of row pointers. Exported for direct callers; the library does not use it.
 #ifndef TAVO_DSP_MATRIX_H
 #define TAVO_DSP_MATRIX_H
 
@@ -6,8 +6,9 @@
 
 extern "C" {
 
-// d[rows][cols] = a[rows][inner] x b[inner][cols]. Sums in double, in the order of inner. Terms
-// with a zero factor are skipped; where a[i][k] is zero, row k of b is not read. Returns rows.
+// Stores the product of a[rows][inner] and b[inner][cols] in d[rows][cols]. Adds the terms in
+// double precision and in ascending order of the inner index. Terms with a zero factor are skipped;
+// where a[i][k] is zero, row k of `b` is not read. Returns `rows`.
 int32_t MultiplyMtxs(int32_t rows, int32_t cols, int32_t inner, const float *const *a,
                      const float *const *b, double *const *d);
 }

@@ -44,9 +44,9 @@ Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
     return peaks;
 }
 
-// Suppresses the positions within `radius` of `index`. A larger peak in that range cannot have
-// survived, or it would have suppressed this one, so marking it again changes nothing. Survivors
-// are more than `radius` apart, so all calls together mark each position at most three times.
+// Suppresses the positions within `radius` of `index`. Larger peaks in that range are already
+// suppressed: had one survived, it would have suppressed this peak. Survivors are more than
+// `radius` apart, so all calls together mark each position at most three times.
 void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius) {
     if (radius < 0) return;
     const int64_t begin = index > radius ? index - radius : 0;
@@ -54,7 +54,8 @@ void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius)
     memset(marks + begin, kSuppressed, static_cast<size_t>(end - begin + 1));
 }
 
-// Writes the surviving peaks, largest first, at most `limit`. Returns how many it wrote.
+// Writes the peaks that survive, in the order given and at most `limit` of them. Each one
+// suppresses its neighbours. Returns the number of peaks written.
 template <typename Record, typename Index>
 int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int64_t len,
                         int64_t radius, int64_t limit, Index *out) {
@@ -70,7 +71,7 @@ int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int6
 
 // Suppresses the positions within `radius` of any priority position, in two sweeps.
 void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t radius) {
-    int64_t distance = kFar;  // to the nearest priority position on the side already swept
+    int64_t distance = kFar;  // from the nearest priority position already swept
     for (int64_t i = 0; i < len; ++i) {
         distance = (marks[i] & kPriority) != 0 ? 0 : distance + 1;
         if (distance <= radius) marks[i] = static_cast<uint8_t>(marks[i] | kSuppressed);
@@ -82,8 +83,8 @@ void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t radius) {
     }
 }
 
-// findNearestIndex by binary search, for strictly ascending positions and a target of at least 0. A
-// long song has thousands of targets among hundreds of thousands of peaks.
+// Same as findNearestIndex, but by binary search: a long song has thousands of targets and hundreds
+// of thousands of peaks. `list` must be strictly ascending, and `target` must not be negative.
 int32_t search_nearest(const int32_t *list, int32_t target, int32_t n) {
     int32_t begin = 0;  // entries before begin are below target, entries from end on are not
     int32_t end = n;
@@ -100,8 +101,8 @@ int32_t search_nearest(const int32_t *list, int32_t target, int32_t n) {
     return list[begin] - target >= target - list[begin - 1] ? begin - 1 : begin;
 }
 
-// Writes the peaks nearest to the priority positions and marks them. Returns how many it wrote; -1
-// if memory runs out.
+// Writes the peaks nearest to the priority positions and marks them. Returns the number of peaks
+// written, or -1 if memory runs out.
 int32_t write_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *priority,
                          int32_t n_priority, uint8_t *marks, int32_t *out) {
     if (count < 2 || n_priority < 1) return 0;
@@ -111,7 +112,7 @@ int32_t write_priorities(const PEAK_INFO *peaks, int32_t count, const int32_t *p
     for (int32_t k = 0; k < count; ++k) list[k] = peaks[k].index;
     int32_t priorities = 0;
     for (int32_t k = 0; k < n_priority; ++k) {
-        // The distance to a target below 0 may wrap around, which only the linear search
+        // The distance to a negative target may wrap around, which only the linear search
         // reproduces.
         const int32_t nearest = priority[k] < 0 ? findNearestIndex(list, priority[k], count)
                                                 : search_nearest(list, priority[k], count);
@@ -142,8 +143,8 @@ int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_
     if (peaks != nullptr && marks != nullptr) {
         qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO_F), compare_peak_f);
         const int64_t limit = max_count == 0 ? count : static_cast<int64_t>(max_count);
-        // The bounds are included. With a distance of 0 the range is the peak itself, so none is
-        // suppressed.
+        // A peak exactly min_dist away is suppressed. With a distance of 0, the range is only the
+        // peak itself, so nothing else is suppressed.
         written = write_survivors(peaks, count, marks, len, min_dist, limit, out);
     }
     free(marks);
@@ -162,7 +163,7 @@ int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out)
         if (min_dist != 0) {
             qsort(peaks, static_cast<size_t>(count), sizeof(PEAK_INFO), compare_peak);
         }
-        // The bounds are excluded: a peak min_dist away survives.
+        // A peak exactly min_dist away survives.
         const auto radius = static_cast<int64_t>(min_dist) - 1;
         written = write_survivors(peaks, count, marks, len, radius, count, out);
     }

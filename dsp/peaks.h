@@ -1,6 +1,6 @@
-// Peak picking. A peak is an index, neither first nor last, whose value is greater than both of its
-// neighbours. The caller owns every array. Callers: highlight/search.h (rising edges of the
-// loudness curve), beat/candidates.h (peaks of the onset envelope).
+// Finds peaks. A peak is an index, neither the first nor the last, whose value is greater than both
+// neighbouring values. The caller owns every array. Used by highlight/search.h for the rising edges
+// of the loudness curve and by beat/candidates.h for the peaks of the onset envelope.
 #ifndef TAVO_DSP_PEAKS_H
 #define TAVO_DSP_PEAKS_H
 
@@ -20,26 +20,28 @@ static_assert(offsetof(PEAK_INFO, index) == 8 && sizeof(PEAK_INFO_F) == 8);
 extern "C" {
 
 // Finds the peaks of x[len], largest first, and drops each one within min_dist of a larger one.
-// Writes at most max_count (0: no limit) to out[min(max_count, len / 2)]. Returns how many it
-// wrote.
+// Writes at most max_count peaks to `out`, or all if max_count is 0; `out` needs len / 2 entries at
+// most. Returns the number of peaks written.
 int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_t max_count,
                          uint32_t *out);
 
-// Finds all peaks in ascending order if min_dist is 0; else largest first, dropping each one closer
-// than min_dist to a larger one. out: [len / 2]. Returns how many it wrote.
+// If min_dist is 0, finds all peaks in ascending order. Otherwise, finds them largest first and
+// drops each one closer than min_dist to a larger one. Writes them to out[len / 2] and returns
+// their number.
 int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out);
 
-// Finds the peaks nearest to the priority positions, which are always kept; then the others,
-// largest first, dropping each one closer than min_dist to a peak already written. out: [n_priority
-// + len / 2]. Returns how many it wrote; -1 if min_dist is 0.
+// First writes the peak nearest to each priority position, unless that is the last peak. Then
+// writes the other peaks, largest first, dropping each one closer than min_dist to a peak already
+// written. `out` has n_priority + len / 2 entries. Returns the number of peaks written, or -1 if
+// min_dist is 0.
 int32_t findPeaksPriority(const double *x, int64_t len, int32_t min_dist, int32_t *out,
                           const int32_t *priority, int32_t n_priority);
 
-// Index of the element of list[n] (ascending) nearest to target; the lower index if two are equally
-// near. 0 if n < 2.
+// Returns the index of the element of list[n] (ascending) that is nearest to `target`, or the lower
+// index if two are equally near. Returns 0 if `n` is less than 2.
 int32_t findNearestIndex(const int32_t *list, int32_t target, int32_t n);
 
-// First index at which x[n] equals value; 0 if it does not occur.
+// Returns the first index at which x[n] equals `value`, or 0 if the value does not occur.
 int32_t findIndex(const double *x, int32_t n, double value);
 }
 

@@ -51,8 +51,8 @@ int32_t partition(int32_t lo, int32_t hi, double *a) {
     return static_cast<int32_t>(j);
 }
 
-// The two parts are independent. Recursing into the smaller one limits the depth to log2 of the
-// length; the result is the same.
+// Recursing only into the smaller part limits the depth to log2 of the length. The two parts are
+// independent, so the result does not depend on their order.
 void quickSort(int32_t lo, int32_t hi, double *a) {
     while (lo < hi) {
         const int32_t middle = partition(lo, hi, a);

@@ -1,5 +1,5 @@
-// Comparators for qsort, which never report equality, and an in-place quicksort of doubles.
-// Callers: dsp/peaks.h, beat/power_rise.h (block levels).
+// Comparators for qsort, which never report equality, and an in-place quicksort of doubles. Used by
+// dsp/peaks.h and, to sort block levels, by beat/power_rise.h.
 #ifndef TAVO_DSP_SORT_H
 #define TAVO_DSP_SORT_H
 
@@ -13,7 +13,7 @@ int compare_value(const void *a, const void *b);   // double, ascending
 int compare_fvalue(const void *a, const void *b);  // float, ascending
 int compare_ivalue(const void *a, const void *b);  // int32_t, ascending
 
-// Sorts a[lo .. hi] ascending, both ends included.
+// Sorts a[lo .. hi], both ends included, in ascending order.
 void quickSort(int32_t lo, int32_t hi, double *a);
 
 // Moves a[lo] to its sorted position among a[lo .. hi] and returns that position.

@@ -1,5 +1,5 @@
-// Mean and population standard deviation in two passes, in index order. NaN if n is 0. Callers:
-// beat/onset_envelope.h (doubles), highlight/search.h (floats).
+// Computes the mean and the population standard deviation in two passes, in index order. Both are
+// NaN if n is 0. Used by beat/onset_envelope.h (doubles) and highlight/search.h (floats).
 #ifndef TAVO_DSP_STATS_H
 #define TAVO_DSP_STATS_H
 
