@@ -1,7 +1,7 @@
-// Stage 7: the highlight start of a decoded song.
+// Stage 7: finds the start of the highlight in a decoded song.
 //
-// Input: TAVO_CTX with pcm, pcm_bytes, fmt, duration. Output: hl.hl_pos, milliseconds. Follows
-// pcm/decode.h; precedes the callback, or pcm/from_highlight.h in mode 2.
+// Input: a TAVO_CTX with pcm, pcm_bytes, fmt and duration. Output: hl.hl_pos in milliseconds.
+// Follows pcm/decode.h and precedes the callback or, in mode 2, pcm/from_highlight.h.
 #ifndef TAVO_HIGHLIGHT_POSITION_H
 #define TAVO_HIGHLIGHT_POSITION_H
 
@@ -9,7 +9,8 @@
 
 extern "C" {
 
-// Returns the start in milliseconds and stores it in hl.hl_pos. 0 if the PCM is shorter than 6 s.
+// Returns the start of the highlight in milliseconds, or 0 if the PCM is shorter than 6 s, and
+// stores it in hl.hl_pos.
 uint32_t getHLPosition(TAVO_CTX *ctx);
 
 // Releases the loudness curve and the context itself. Null is ignored.

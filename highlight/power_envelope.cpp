@@ -9,16 +9,15 @@
 namespace {
 
 constexpr int32_t kSections = 2;  // parts of the song that are summed side by side
-constexpr int32_t kOverlap =
-    kPowerWindowSeconds / kPowerHopSeconds;  // windows that overlap at each sample
+constexpr int32_t kOverlap = kPowerWindowSeconds / kPowerHopSeconds;  // windows that cover a sample
 
 float power_of_sum(double sum, int64_t window) {
     const auto mean = static_cast<float>(sum / static_cast<double>(window));
     return 10.0f * log10f(mean + 1.0f);
 }
 
-// Adds hop samples of both sections to the three windows that overlap there. Each window adds its
-// samples in order, so it is bit-identical to window_power.
+// Adds `hop` samples of each section to the sums of the three windows that overlap there. Each sum
+// adds its samples in order, so the powers are bit-identical to those of window_power.
 void add_hop(double_pair sums[kOverlap], const int16_t *first, const int16_t *second, int64_t hop) {
     double_pair oldest = sums[0];
     double_pair middle = sums[1];
@@ -66,7 +65,7 @@ float window_power(const int16_t *pcm, int64_t window) {
 
 void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *out) {
     if (count < 1) return;
-    // With an odd count, both sections compute the value of the window that they share.
+    // If `count` is odd, both sections compute the value of the window that they share.
     const int64_t length = (count + kSections - 1) / kSections;
     const int64_t second = count - length;
     double_pair sums[kOverlap] = {};
@@ -87,7 +86,7 @@ void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *o
 int32_t _calc_power_level(const int16_t *pcm, int64_t sample_count, int32_t rate, TAVO_HL_CTX *hl) {
     hl->power_count = 0;
     if (rate <= 0) return 0;
-    // Start of the last window.
+    // Latest possible start of a window.
     const int64_t last = sample_count - int64_t{kPowerWindowSeconds} * rate;
     if (last < 0) return 0;
     const int64_t hop = int64_t{kPowerHopSeconds} * rate;

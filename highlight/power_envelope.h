@@ -1,15 +1,15 @@
-// Stage 7a: the loudness curve of the song.
+// Stage 7a: computes the loudness curve of the song.
 //
-// Input: 16-bit mono PCM at the source rate. Output: TAVO_HL_CTX.power, one float every 2 s for a
-// window of 6 s: 10 log10(mean square + 1), 0 for silence, about 3.01 for full scale. Precedes
-// highlight/search.h.
+// Input: 16-bit mono PCM at the source rate. Output: TAVO_HL_CTX.power, one float every 2 s, each
+// measured over a window of 6 s. A value is 10 log10(mean square + 1): 0 for silence, about 3.01
+// for full scale. Precedes highlight/search.h.
 #ifndef TAVO_HIGHLIGHT_POWER_ENVELOPE_H
 #define TAVO_HIGHLIGHT_POWER_ENVELOPE_H
 
 #include "common/tavo_ctx.h"
 
-constexpr int32_t kPowerWindowSeconds = 6;  // length of the window of one value
-constexpr int32_t kPowerHopSeconds = 2;     // distance between values
+constexpr int32_t kPowerWindowSeconds = 6;  // length of the window that a value covers
+constexpr int32_t kPowerHopSeconds = 2;     // distance between successive values
 
 extern "C" {
 
@@ -18,17 +18,18 @@ extern "C" {
 int32_t _calc_power_level(const int16_t *pcm, int64_t sample_count, int32_t rate, TAVO_HL_CTX *hl);
 }
 
-// x / 32767.0 is x * kInverseHead + x * kInverseTail. The quotient's binary digits repeat every 15
-// places, the first product is exact, and the sum rounds once, so the result is bit-identical for
-// every 16-bit x.
+// For every 16-bit x, x * kInverseHead + x * kInverseTail is bit-identical to x / 32767.0: the
+// binary digits of 1 / 32767 repeat every 15 places, the first product is exact, and the sum is
+// rounded once.
 constexpr double kInverseHead = 0x1p-15 + 0x1p-30 + 0x1p-45;
 constexpr double kInverseTail = 0x1p-60 + 0x1p-75;
 
-// 10 log10(mean square + 1) of `window` samples. The sum is double, the rest single precision.
+// Returns 10 log10(mean square + 1) of `window` samples. The sum is computed in double precision,
+// the rest in single precision.
 float window_power(const int16_t *pcm, int64_t window);
 
-// Computes window_power for `count` windows of 3 * hop samples, one hop apart, into out[count].
-// pcm: [(count + 2) * hop].
+// Computes window_power for `count` windows of 3 * `hop` samples that start one hop apart, and
+// stores the values in out[count]. `pcm` has (`count` + 2) * `hop` samples.
 void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *out);
 
 #endif

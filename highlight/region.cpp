@@ -4,10 +4,10 @@ namespace {
 
 constexpr int32_t kMaxToValley =
     25;                            // points (50 s): a valley further away does not end the region
-constexpr int32_t kScanBegin = 7;  // points after chosen (14 s)
-constexpr int32_t kScanEnd = 24;   // points after chosen (48 s), included
+constexpr int32_t kScanBegin = 7;  // first point scanned after `chosen` (14 s)
+constexpr int32_t kScanEnd = 24;   // last point scanned after `chosen` (48 s)
 constexpr int64_t kMinLead = 3;    // points: a shorter lead does not move the start
-constexpr int64_t kNearIdeal = 2;  // a valley this close to the ideal start wins
+constexpr int64_t kNearIdeal = 2;  // points: a valley this close to the ideal start wins
 
 struct song_curve {
     const float *norm;
@@ -25,15 +25,15 @@ struct candidate {
     bool present;
     bool at_end;  // the distance was still falling at the last entry of the list
     int32_t pos;
-    int64_t distance;  // from the ideal start
+    int64_t distance;  // distance from the ideal start, points
 };
 
 int64_t distance(int64_t a, int64_t b) {
     return a < b ? b - a : a - b;
 }
 
-// Walks along `list` from index `first` towards index `last`, as long as each entry is strictly
-// nearer to `ideal` than the one before. step is 1 or -1.
+// Walks along `list` from index `first` towards index `last` as long as each entry is strictly
+// nearer to `ideal` than the one before. `step` is 1 or -1.
 candidate walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_t last,
                        int32_t step) {
     int32_t k = first;
@@ -45,21 +45,21 @@ candidate walk_towards(int64_t ideal, const int32_t *list, int32_t first, int32_
     return {true, k == last, list[k], nearest};
 }
 
-// Index of the last valley at or before `chosen`, or -1.
+// Returns the index of the last valley at or before `chosen`, or -1.
 int32_t valley_before(const song_curve *song, int32_t chosen) {
     int32_t k = 0;
     while (k < song->nv && song->valleys[k] <= chosen) ++k;
     return k - 1;
 }
 
-// True if the loudness at `idx` is below `last` and then stays below the mean. Points past the end
-// of the song do not count as below.
+// True if the loudness at `idx` is below `last` and the mean of the second and the third point
+// after it is below the mean of the song. False if these points are past the end of the song.
 bool is_drop(const song_curve *song, int32_t idx, float last) {
     if (!(song->norm[idx] < last) || idx + 3 >= song->n) return false;
     return (song->norm[idx + 2] + song->norm[idx + 3]) * 0.5f < song->mean;
 }
 
-// End of the loud segment that contains `chosen`, or `fallback` if none does.
+// Returns the end of the loud segment that contains `chosen`, or `fallback` if none does.
 int32_t segment_end(const song_curve *song, int32_t chosen, int32_t fallback) {
     for (int32_t k = 0; k < song->nseg; ++k) {
         if (song->pairs[2 * k] <= chosen && chosen < song->pairs[2 * k + 1]) {
@@ -69,7 +69,7 @@ int32_t segment_end(const song_curve *song, int32_t chosen, int32_t fallback) {
     return fallback;
 }
 
-// End of the region that starts at `chosen`, used if no valley bounds it.
+// Returns the end of the region that starts at `chosen`. Used if no valley bounds the region.
 int32_t scan_for_end(const song_curve *song, int32_t chosen) {
     const float reference = song->norm[chosen];
     float last = reference;
@@ -98,8 +98,8 @@ int32_t scan_for_end(const song_curve *song, int32_t chosen) {
     return found ? drop_pos : segment_end(song, chosen, lowest_pos);
 }
 
-// Start of a region that should begin `lead` points before `chosen`. before: index of the valley at
-// or before `chosen`, or -1.
+// Returns the start of a region that should begin `lead` points before `chosen`. `before` is the
+// index of the last valley at or before `chosen`, or -1.
 int64_t choose_start(const song_curve *song, int32_t chosen, int32_t before, int64_t lead) {
     const int64_t ideal = chosen - lead;
     candidate valley = {};
@@ -142,7 +142,7 @@ uint32_t tavo_select_highlight_region(const float *norm, int32_t n, int32_t len_
     const bool valley_follows = before + 1 < nv && valleys[before + 1] - chosen <= kMaxToValley;
     const int32_t end = valley_follows ? valleys[before + 1] : scan_for_end(&song, chosen);
     const int32_t length = end > chosen ? end - chosen : 0;
-    const auto lead = static_cast<int64_t>(len_pts) - length;  // points wanted before chosen
+    const auto lead = static_cast<int64_t>(len_pts) - length;  // points wanted before `chosen`
     const int64_t start = lead < kMinLead ? chosen : choose_start(&song, chosen, before, lead);
     return static_cast<uint32_t>(fit_in_song(&song, start, len_pts));
 }

@@ -14,8 +14,8 @@
 
 namespace {
 
-constexpr int32_t kMinPoints = 4;     // the curve must have more points after the skipped ones
-constexpr int32_t kMinSegment = 3;    // points in a loud segment
+constexpr int32_t kMinPoints = 4;     // more points than this must follow the skipped ones
+constexpr int32_t kMinSegment = 3;    // minimum number of points in a loud segment
 constexpr int32_t kMinLoudAfter = 4;  // points that a segment must last after an edge
 constexpr int32_t kNearValley = 3;    // an edge within this many points before a valley is ignored
 constexpr int32_t kMaxSegments = 30;
@@ -24,14 +24,14 @@ constexpr uint32_t kEdgeDistance = 1;
 constexpr int32_t kPercentile = 60;
 constexpr double kMinSecondScore = 0.1;
 
-// The loudness curve and what the search finds on it. Unused entries of the lists are 0.
+// The loudness curve and what the search finds in it. Unused entries of the lists are 0.
 struct search_state {
     const float *norm;  // [n] loudness divided by its largest value
     const float *diff;  // [n - 1] differences of neighbouring points
     int32_t n;
     int32_t skip;
     int32_t tail;
-    float mean;  // of norm
+    float mean;  // mean of norm
     float std;
     float percentile;  // 60th percentile of norm
     int32_t nseg;
@@ -47,15 +47,14 @@ uint32_t point_ms(int64_t k) {
     return static_cast<uint32_t>(static_cast<int64_t>(static_cast<float>(k + k) * 1000.0f));
 }
 
-// Ascending with NaNs last: a strict weak ordering of any values.
+// Orders values ascending, with NaNs last. This is a strict weak ordering of all values.
 bool is_less(float a, float b) {
     if (std::isnan(a) || std::isnan(b)) return !std::isnan(a);
     return a < b;
 }
 
-// Finds the largest value and the 60th percentile. Returns false if memory runs out. std::sort
-// allocates nothing; qsort may allocate, and its fallback needs a comparator that can report
-// equality.
+// Finds the largest value and the 60th percentile. Returns false if memory runs out. std::sort does
+// not allocate; qsort may, and its fallback needs a comparator that can report equality.
 bool rank_curve(const float *power, int32_t n, float *largest, float *percentile) {
     const auto count = static_cast<size_t>(n);
     auto *sorted = static_cast<float *>(note_shortage(malloc(count * sizeof(float))));
@@ -69,8 +68,8 @@ bool rank_curve(const float *power, int32_t n, float *largest, float *percentile
 }
 
 void find_segments(search_state *s) {
-    bool above =
-        false;  // even if point 0 is above: a song loud from the start has a segment from point 0
+    // Point 0 counts as quiet, so a song that is loud from the start has a segment there.
+    bool above = false;
     for (int32_t k = 0; k < s->n - 1 && s->nseg < kMaxSegments; ++k) {
         const bool next_above = s->norm[k + 1] > s->mean;
         if (!above && next_above) s->start[s->nseg] = k;
@@ -86,7 +85,7 @@ void find_segments(search_state *s) {
     }
 }
 
-// Points from `pos` to the next valley; 0 if no valley follows.
+// Returns the number of points from `pos` to the next valley, or 0 if no valley follows.
 int32_t valley_distance(const search_state *s, int32_t pos) {
     for (int32_t k = 0; k < s->nv; ++k) {
         if (s->valley[k] > pos) return s->valley[k] - pos;
@@ -94,7 +93,7 @@ int32_t valley_distance(const search_state *s, int32_t pos) {
     return 0;
 }
 
-// True if `pos` is in a loud segment that lasts long enough after it.
+// True if `pos` is outside the tail and in a loud segment that lasts long enough after it.
 bool is_in_segment(const search_state *s, int32_t pos) {
     if (pos > s->n - s->tail) return false;
     for (int32_t k = 0; k < s->nseg; ++k) {
@@ -103,7 +102,7 @@ bool is_in_segment(const search_state *s, int32_t pos) {
     return false;
 }
 
-// The edge with the best score; 0 if no edge is scored.
+// Returns the edge with the best score, or 0 if no edge qualifies.
 int32_t score_edges(const search_state *s) {
     float best = 0.0f;
     float second = 0.0f;
@@ -130,7 +129,8 @@ int32_t score_edges(const search_state *s) {
     return best_pos != 0 ? best_pos : second_pos;
 }
 
-// The first edge that leads to a loud point, or the last edge if none does.
+// Returns the point after the first edge that leads to a loud point, or after the last edge if none
+// does.
 int32_t first_loud_edge(const search_state *s) {
     int32_t pos = 0;
     for (int32_t k = 0; k < s->edges; ++k) {
@@ -147,7 +147,8 @@ int32_t choose_edge(const search_state *s) {
     return scored != 0 ? scored : first_loud_edge(s);
 }
 
-// The region's start if a region of the requested length would extend past the end of the song.
+// Returns the start of the first loud segment or the first valley, whichever comes first. It is the
+// start of the region if even a region from there would reach the end of the song.
 int32_t fallback_point(const search_state *s) {
     const int32_t start = s->nseg > 0 ? s->start[0] : 0;
     const int32_t valley = s->nv > 0 ? s->valley[0] : 0;
@@ -168,7 +169,8 @@ int64_t select_start(const search_state *s, int32_t chosen, int32_t hl_param) {
                                         s->nseg, s->mean, s->std);
 }
 
-// Runs the search. norm, diff: [n] scratch. Returns milliseconds.
+// Searches the curve. `norm` and `diff` are scratch memory for one value per point. Returns the
+// coarse start in milliseconds.
 uint32_t search_curve(const TAVO_HL_CTX *hl, int32_t duration_s, float *norm, float *diff) {
     search_state s = {};
     s.norm = norm;

@@ -9,9 +9,9 @@ constexpr double kHopSeconds = 0.4;
 constexpr int64_t kSpanSeconds = 12;   // from the start of the first window to the end of the last
 constexpr int64_t kBeforeMs = 3000;    // the first window starts this long before the coarse start
 constexpr int64_t kMinAfterMs = 9000;  // audio required after the coarse start
-constexpr int64_t kEarliest = -999;    // ms x Hz: less than one sample before the start of the song
-constexpr int64_t kMaxFrames = 64;     // 27 at the usual rates, at most 44 at any rate
-constexpr int64_t kRiseFrames = 5;     // windows averaged after the start of a rise
+constexpr int64_t kEarliest = -999;  // lower limit in ms * Hz: less than one sample before the song
+constexpr int64_t kMaxFrames = 64;   // windows: 27 at the usual rates, at most 44 at any rate
+constexpr int64_t kRiseFrames = 5;   // windows averaged after the start of a rise
 constexpr float kMinRise = 0.13f;
 
 // Loudness windows around the coarse start.
@@ -43,8 +43,8 @@ void measure_frames(const int16_t *pcm, const frame_plan *frames, float *power) 
     }
 }
 
-// Index of the window before the largest rise, the first if several are equal; -1 if no rise
-// exceeds kMinRise.
+// Returns the index of the window before the largest rise, the first if several are equal, or -1 if
+// no rise exceeds kMinRise.
 int64_t largest_rise(const float *power, int64_t count) {
     int64_t best = -1;
     float best_rise = kMinRise;
@@ -59,7 +59,8 @@ int64_t largest_rise(const float *power, int64_t count) {
     return best;
 }
 
-// Index of the smallest of the kRiseFrames steps from `frame` on; the first of equal ones.
+// Returns the index of the smallest of the kRiseFrames steps from `frame` on, the first if several
+// are equal.
 int64_t smallest_step(const float *power, int64_t frame) {
     int64_t best = frame;
     float best_step = power[frame + 1] - power[frame];

@@ -2,10 +2,9 @@
 
 namespace {
 
-constexpr double kMinGapSeconds = 7.0;  // low points this far apart belong to different stretches
-constexpr float kLoudMean =
-    0.5f;  // a song with a higher mean is loud throughout, and only deep dips count
-constexpr double kDeepDip = 1.5;  // standard deviations below the mean
+constexpr double kMinGapSeconds = 7.0;  // low points this far apart are in different stretches
+constexpr float kLoudMean = 0.5f;       // in a song with a higher mean, only deep dips count
+constexpr double kDeepDip = 1.5;        // standard deviations below the mean
 
 float low_threshold(float mean, float std) {
     if (mean > kLoudMean) {
@@ -14,7 +13,7 @@ float low_threshold(float mean, float std) {
     return mean - std;
 }
 
-// Minimum distance between stretches in points, rounded toward zero.
+// Returns the minimum distance between quiet stretches in points, rounded toward zero.
 int32_t minimum_gap(float hop_s) {
     const double gap = kMinGapSeconds / static_cast<double>(hop_s);
     if (gap > 0.0 && gap < static_cast<double>(INT32_MAX)) return static_cast<int32_t>(gap);
