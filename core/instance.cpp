@@ -16,10 +16,10 @@ constexpr char kMark[4] = {'Z', 'E', 'K', 'A'};
 struct result_record {
     TAVO_INFO info;  // must be first: TAVO_CTX.info points to it
     TAVO_LISTENER listener;
-    void *user;  // the host's argument
+    void *user;  // the listener's argument
 };
 
-// The callback of instances that have a listener.
+// The callback of an instance that has a listener.
 void call_listener(TAVO_INFO *info) {
     const auto *record = reinterpret_cast<const result_record *>(info);
     record->listener(info, record->user);
@@ -58,7 +58,7 @@ TAVO_CTX *open_instance(const TAVO_PARAM *param, int32_t *err) {
     TAVO_CTX *ctx = new_instance(param->mode);
     if (ctx == nullptr) return nullptr;
     if (tavo_decode_init(ctx, param) != 0) {
-        *err = TAVO_ERR_HANDLE;  // for any reason; tavo_probe reports which
+        *err = TAVO_ERR_HANDLE;  // whatever the cause; tavo_probe reports it
         clearTavoCtx(ctx);
         return nullptr;
     }

@@ -1,7 +1,7 @@
 // Creates, checks and releases instances.
 //
-// Input: TAVO_PARAM. Output: TAVO_CTX with its sub-contexts and a planned decoding. Follows
-// pcm/decode.h; precedes core/lifecycle.h.
+// Input: a TAVO_PARAM. Output: a TAVO_CTX with its sub-contexts and a planned decoding. Follows
+// pcm/decode.h and precedes core/lifecycle.h.
 #ifndef TAVO_CORE_INSTANCE_H
 #define TAVO_CORE_INSTANCE_H
 
@@ -9,13 +9,14 @@
 
 extern "C" {
 
-// Releases the instance, which may be half built, and everything that it owns. Checks nothing.
+// Releases the instance, which may be only partly built, and everything that it owns. The handle is
+// not checked.
 void clearTavoCtx(TAVO_CTX *ctx);
 }
 
-// Creates an instance in the ready state; the locks of core/lifecycle.h must exist. Returns it with
-// *err TAVO_OK; the caller owns it. On failure returns null, releases everything and sets *err to
-// TAVO_ERR_MEMORY or, if the decoding cannot be planned, TAVO_ERR_HANDLE.
+// Creates an instance in the ready state. The locks of core/lifecycle.h must exist. Returns the
+// instance, owned by the caller, with *err TAVO_OK. On failure, returns null, releases everything
+// and sets *err to TAVO_ERR_MEMORY or, if the decoding cannot be planned, to TAVO_ERR_HANDLE.
 TAVO_CTX *open_instance(const TAVO_PARAM *param, int32_t *err);
 
 // True if the handle is not null and has the mark of an instance.
@@ -24,7 +25,8 @@ bool is_instance(const TAVO_CTX *ctx);
 // True if the job has set its final state.
 bool has_ended(const TAVO_CTX *ctx);
 
-// True if the mode finds beats or a highlight, respectively. Both are false outside modes 0 to 2.
+// True if the mode includes the beats or the highlight, respectively. Both are false for values
+// outside 0 to 2.
 inline bool finds_beats(int32_t mode) {
     return mode == TAVO_MODE_BEATS || mode == TAVO_MODE_BOTH;
 }

@@ -20,15 +20,15 @@ void deliver(TAVO_CTX *ctx) {
     if (ctx->callback != nullptr) ctx->callback(ctx->info);
 }
 
-// Beat times count from the start of the analysed signal. Converts them to times from the start of
-// the file.
+// Converts beat times, which count from the start of the analysed signal, to times from the start
+// of the file.
 void shift_beats(TAVO_ONSET_CTX *onset, int32_t start_ms) {
     const auto shift = static_cast<float>(start_ms);
     for (int32_t i = 0; i < onset->beat_count; ++i) onset->beat_times[i] += shift;
 }
 
 // Runs the beat analysis if the conversion to the analysis rate succeeded, and reports the result.
-// A job without beats fails, whatever the reason. A highlight is reported in any case.
+// A job that finds no beats fails, whatever the reason, but still reports its highlight.
 void find_and_report_beats(TAVO_CTX *ctx, bool from_highlight, bool converted) {
     TAVO_INFO *info = ctx->info;
     TAVO_ONSET_CTX *onset = converted ? ctx->onset : nullptr;

@@ -43,7 +43,7 @@ bool runs_job_of(const TAVO_CTX *ctx) {
     return pthread_equal(ctx->worker, pthread_self()) != 0;
 }
 
-// A job that the host runs on its own thread, without tavo_analyze, has no thread to join.
+// A job that the host runs on a thread of its own, without tavo_analyze, has no worker to join.
 void join_worker(const TAVO_CTX *ctx) {
     if (pthread_equal(ctx->worker, pthread_t{}) == 0) pthread_join(ctx->worker, nullptr);
 }

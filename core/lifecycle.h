@@ -1,8 +1,8 @@
-// Starts and stops the job of an instance. Declares the two locks that exist from the creation of
-// an instance to its release.
+// Starts and stops the job of an instance. Declares the lock and the condition that exist from the
+// creation of an instance to its release.
 //
 // Input: the calls of include/tavo.h. Output: a job of core/jobs.h on its own thread. Follows
-// core/instance.h and core/jobs.h; precedes the host.
+// core/instance.h and core/jobs.h and precedes the host.
 #ifndef TAVO_CORE_LIFECYCLE_H
 #define TAVO_CORE_LIFECYCLE_H
 
@@ -16,12 +16,12 @@ extern pthread_mutex_t tavo_mutex;
 extern pthread_cond_t tavo_cond;
 
 // Sets the stop flag and waits until the job has ended; its callback may still be running. The
-// caller must not hold tavo_mutex. Returns TAVO_OK, at once if no job was started; TAVO_ERR_HANDLE
-// if ctx is not an instance.
+// caller must not hold tavo_mutex. Returns TAVO_OK, immediately if no job was started, or
+// TAVO_ERR_HANDLE if `ctx` is not an instance.
 int32_t _tavo_quit(TAVO_CTX *ctx);
 
-// Thread entry of the watcher that _tavo_quit starts. It polls the state and then signals
-// tavo_cond.
+// The thread entry of the watcher that _tavo_quit starts. It polls the state until the job has
+// ended and then signals tavo_cond.
 void *_thd_quit_wait(void *arg);
 }
 
