@@ -7,7 +7,7 @@
 
 namespace {
 
-constexpr int64_t kHugePageBytes = 2 << 20;  // on most systems
+constexpr int64_t kHugePageBytes = 2 << 20;  // size on most systems
 
 int32_t incomplete = 0;  // atomic access only: the job's threads set it
 
@@ -19,7 +19,7 @@ uintptr_t page_size() {
 
 void advise_huge_pages(void *buffer, int64_t bytes) {
     if (buffer == nullptr || bytes < kLargeBytes) return;
-    // Extends the range to whole pages, so that neighbouring buffers share huge pages and each
+    // Extend the range to whole pages, so that neighbouring buffers share huge pages and each
     // buffer stays one mapping, which realloc can move. The advice does no harm to other data in
     // the first and last page.
     const uintptr_t page = page_size();
@@ -29,7 +29,7 @@ void advise_huge_pages(void *buffer, int64_t bytes) {
 }
 
 uint8_t *allocate_buffer(int64_t bytes) {
-    // Asks for at least one byte, because malloc(0) may return null.
+    // Ask for at least one byte, because malloc(0) may return null.
     const auto size = static_cast<size_t>(std::max<int64_t>(bytes, 1));
     if (bytes < kLargeBytes) return static_cast<uint8_t *>(malloc(size));
     void *buffer = nullptr;

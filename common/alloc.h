@@ -1,7 +1,7 @@
-// Checked sizes and zeroed memory, for every folder of the library.
+// Checks sizes for overflow and allocates memory, for every folder of the library.
 //
-// Sizes are computed from durations and rates stated by files, so they are 64-bit and checked for
-// overflow.
+// Sizes are computed from durations and rates that files state. They are therefore 64-bit and
+// checked for overflow.
 #ifndef TAVO_COMMON_ALLOC_H
 #define TAVO_COMMON_ALLOC_H
 
@@ -11,8 +11,8 @@
 
 constexpr int64_t kBytesPerSample = 2;  // 16-bit mono
 
-// Computes *result = value * factor / divisor. False if value or factor is negative, divisor is
-// below 1, or the product overflows.
+// Sets *result to value * factor / divisor. Returns false if `value` or `factor` is negative,
+// `divisor` is less than 1 or the product overflows.
 inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *result) {
     int64_t product = 0;
     if (value < 0 || factor < 0 || divisor < 1) return false;
@@ -21,13 +21,13 @@ inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *
     return true;
 }
 
-// Computes the size of a span of PCM in bytes: units (100 ns) * rate (Hz) * 2 / 10,000,000, with
-// the division last. The size may be odd.
+// Computes the size in bytes of PCM that lasts `units` (100 ns each) at `rate` (Hz). The division
+// is the last step, so the size may be odd.
 inline bool span_bytes(int64_t units, int32_t rate, int64_t *bytes) {
     return scale_size(units, rate * kBytesPerSample, kUnitsPerSecond, bytes);
 }
 
-// Computes the size of an array in bytes: `count` * `size` + `extra`.
+// Computes the size in bytes of `count` items of `size` bytes, followed by `extra` bytes.
 inline bool array_bytes(int64_t count, int64_t size, int64_t extra, int64_t *bytes) {
     return scale_size(count, size, 1, bytes) && !__builtin_add_overflow(*bytes, extra, bytes);
 }
@@ -41,28 +41,28 @@ T *zeroed_items(int64_t count) {
     return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
 }
 
-// True if a job has lost part of its audio or of its search, because a read or an allocation has
-// failed since tavo_decode_init cleared the mark. The mark is process-wide, since only one instance
-// may exist.
+// is_incomplete returns true if a job has lost part of its audio or of its search, because a read
+// or an allocation failed. tavo_decode_init clears the mark. The mark is process-wide, because only
+// one instance may exist.
 bool is_incomplete();
 void mark_incomplete();
 void clear_incomplete();
 
-// Marks the job incomplete if memory is null. Returns memory.
+// Marks the job incomplete if `memory` is null. Returns `memory`.
 inline void *note_shortage(void *memory) {
     if (memory == nullptr) mark_incomplete();
     return memory;
 }
 
-constexpr int64_t kLargeBytes = 4 << 20;  // the calls below pay off at this size and above
+constexpr int64_t kLargeBytes = 4 << 20;  // the functions below pay off from this size on
 
-// Asks for huge pages for a large buffer before it is filled: one page fault instead of 512, in a
-// fifth of the time. The system may ignore the request.
+// Asks for huge pages for a large buffer, which must not have been filled yet. A single page fault
+// then replaces 512 and takes a fifth of the time. The system may ignore the request.
 void advise_huge_pages(void *buffer, int64_t bytes);
 
-// Allocates uninitialised memory, at least one byte. The caller frees it. A large buffer starts at
-// a huge page, so that the allocator's header does not split the first one. Returns null if memory
-// runs out.
+// Allocates at least one byte of uninitialised memory. The caller frees it. A large buffer starts
+// on a huge-page boundary, so that the allocator's header does not split the first huge page.
+// Returns null if memory runs out.
 uint8_t *allocate_buffer(int64_t bytes);
 
 // Gives the whole pages between `begin` and `end`, both in one heap buffer, back to the system.

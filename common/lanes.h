@@ -1,5 +1,5 @@
-// Vector types, which hold several numbers in one register, using the compiler's vector extension.
-// Each lane is rounded as it would be alone. Used where independent data needs the same arithmetic.
+// Types of the compiler's vector extension, which hold several numbers in one register. Each lane
+// is rounded as a single number would be. Used where independent data needs the same arithmetic.
 #ifndef TAVO_COMMON_LANES_H
 #define TAVO_COMMON_LANES_H
 
@@ -15,7 +15,7 @@ typedef int64_t int64_pair __attribute__((vector_size(16)));
 typedef int16_t int16_quad __attribute__((vector_size(8)));
 typedef int16_t int16_octet __attribute__((vector_size(16)));
 
-// Loads (stores) two neighbouring doubles, which need only the alignment of a double.
+// Load and store two adjacent doubles, which need only the alignment of a double.
 inline double_pair load_pair(const double *values) {
     double_pair pair;
     memcpy(&pair, values, sizeof pair);

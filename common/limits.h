@@ -1,5 +1,5 @@
-// Limits of the files that can be analysed. The stages refuse a file beyond a limit; the command
-// reports the limit to the user.
+// Limits of the files that can be analysed. The stages refuse files outside these limits; the
+// command prints the limits for the user.
 #ifndef TAVO_COMMON_LIMITS_H
 #define TAVO_COMMON_LIMITS_H
 

@@ -15,7 +15,7 @@
 
 struct TAVO_DECSEG;  // pcm/decode.h
 
-// States of an instance. 3 and 4 are final.
+// States of an instance. Finished and failed are final.
 constexpr int32_t kStateReady = 1;
 constexpr int32_t kStateRunning = 2;
 constexpr int32_t kStateFinished = 3;
@@ -31,19 +31,19 @@ constexpr int32_t kHopSize = 256;         // samples at the analysis rate
 // Format of the stream, as the media source reports it.
 struct TAVO_FMT {
     int32_t sample_rate;  // Hz
-    int32_t channels;     // of the decoder's output; the delivered PCM always has one
+    int32_t channels;     // channels of the decoder's output; the delivered PCM is always mono
     int32_t bits;         // 16
 };
 
-// Highlight: modes 0 and 2.
+// Context of the highlight search, in modes 0 and 2.
 struct TAVO_HL_CTX {
-    int32_t hl_param;     // highlight length requested, seconds; 0 or less for none
+    int32_t hl_param;     // requested highlight length in seconds; 0 or less for none
     float *power;         // [power_count] one loudness value per 2 s, owned
-    int32_t power_count;  // values in power
+    int32_t power_count;  // number of values in power
     uint32_t hl_pos;      // highlight start, milliseconds
 };
 
-// Beats: modes 1 and 2.
+// Context of the beat analysis, in modes 1 and 2.
 struct TAVO_ONSET_CTX {
     int32_t max_beats;    // maximum number of threshold-selected beats; 0 or less for no limit
     int32_t beat_param2;  // stored, never read
@@ -56,15 +56,15 @@ struct TAVO_ONSET_CTX {
 
 struct TAVO_CTX {
     char magic[4];          // "ZEKA", written last when the instance is created
-    int32_t quit;           // 1 once a stop was requested; atomic access only
+    int32_t quit;           // 1 once a stop has been requested; atomic access only
     int16_t *pcm;           // source-rate PCM, mono; null once converted
-    int64_t pcm_bytes;      // bytes: capacity before decoding, bytes decoded afterwards
+    int64_t pcm_bytes;      // capacity before decoding, number of decoded bytes afterwards
     double *ana;            // analysis signal on the 16-bit scale, mono
     int64_t ana_len;        // samples in ana
     int32_t ana_rate;       // Hz: 11025, or 0 in mode 0
     TAVO_DECSEG *seg;       // [1 or 4] decoding segments
-    TAVO_FMT fmt;           // of the stream
-    int64_t duration;       // of the stream, 100-ns units
+    TAVO_FMT fmt;           // format of the stream
+    int64_t duration;       // duration of the stream, 100-ns units
     TAVO_ONSET_CTX *onset;  // modes 1 and 2
     TAVO_HL_CTX *hl;        // modes 0 and 2
     TAVO_CALLBACK callback;
@@ -88,7 +88,7 @@ static_assert(sizeof(void *) != 8 ||
 static_assert(sizeof(void *) != 8 ||
               (offsetof(TAVO_INFO, beat_times) == 8 && offsetof(TAVO_INFO, status) == 16));
 
-// Access to a flag (state, quit) that one thread writes and others read without a lock.
+// Read and write a flag (state, quit) that one thread sets and others read without a lock.
 inline int32_t load_flag(const int32_t *flag) {
     return __atomic_load_n(flag, __ATOMIC_ACQUIRE);
 }

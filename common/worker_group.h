@@ -4,7 +4,7 @@
 // A group has one record per worker. The workers share a mutex, a condition and an array of done
 // flags. A worker's thread entry calls run_worker, and its completion handler calls
 // worker_group_done. The starting thread calls worker_group_run, which waits for all flags and
-// joins every thread. Only then are the results read. Used by pcm/ and beat/.
+// joins every thread. Only then does it read the results. Used by pcm/ and beat/.
 #ifndef TAVO_COMMON_WORKER_GROUP_H
 #define TAVO_COMMON_WORKER_GROUP_H
 
@@ -20,7 +20,7 @@ struct worker_slot {
     void (*body)(void *record);    // called directly if the thread cannot be started
 };
 
-// The body of a thread entry: pushes the completion handler `cleanup`, runs `body` and ends the
+// Implements a thread entry: pushes the completion handler `cleanup`, runs `body` and ends the
 // thread. Both functions receive the record.
 [[noreturn]] void run_worker(void *record, void (*body)(void *), void (*cleanup)(void *));
 
@@ -41,8 +41,8 @@ struct side_work {
 void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *mutex,
                       pthread_cond_t *cond, int32_t *done, const side_work *side = nullptr);
 
-// Allocates and initialises a mutex and a condition. Returns TAVO_OK, or TAVO_ERR_MEMORY on
-// failure, with both null.
+// Allocates and initialises a mutex and a condition. Returns TAVO_OK, or TAVO_ERR_MEMORY with both
+// pointers null.
 int32_t worker_lock_create(pthread_mutex_t **mutex, pthread_cond_t **cond);
 
 // Destroys and frees both and sets the pointers to null. Null pointers are skipped.
