@@ -22,17 +22,18 @@ constexpr jint kEventResult = 1;
 constexpr jint kEventFailure = 2;
 
 // References stored by native_setup. They are counted, because a later native_setup may replace
-// them while a worker thread posts an event with them.
+// them while a worker thread is posting an event with them.
 struct host_refs {
     jclass host_class;  // global reference
     jobject object;     // global reference, or null if the host passed null
-    int32_t users;      // the bridge itself and each event in progress; guarded by host_mutex
+    int32_t users;      // 1 for the bridge and 1 per event in progress; guarded by host_mutex
 };
 
 pthread_mutex_t host_mutex = PTHREAD_MUTEX_INITIALIZER;
 host_refs *current_host = nullptr;  // guarded by host_mutex
 
-// tavo_jni_mutex points here after the first init. Static, so that its creation cannot fail.
+// tavo_jni_mutex points here after the first init. The mutex is static, so that its creation cannot
+// fail.
 pthread_mutex_t lifecycle_mutex = PTHREAD_MUTEX_INITIALIZER;
 
 // Pointers that one thread sets and others read without a lock. Atomic access only.
@@ -42,8 +43,8 @@ TAVO_CTX *instance = nullptr;
 
 TAVO_PARAM init_param = {};  // guarded by tavo_jni_mutex; path is null outside tavo_init
 
-// The thread that is posting an event, or zero. A deinit on that thread must not wait for the lock,
-// which a deinit on another thread may hold while it joins the first. Atomic access only.
+// The thread that is posting an event, or zero. A deinit on that thread must not wait for the lock:
+// another deinit may hold the lock while it joins the posting thread. Atomic access only.
 pthread_t posting_thread = {};
 
 template <typename T>
@@ -71,7 +72,7 @@ long handle_value(const TAVO_CTX *ctx) {
 
 // ---- the lock of init and deinit ----
 
-// Creates the lock on first use, and locks it. Two threads that race to create it get the same
+// Creates the lock on first use and locks it. If two threads race to create it, both get the same
 // lock.
 pthread_mutex_t *lock_for_init() {
     pthread_mutex_t *mutex = nullptr;
@@ -82,7 +83,7 @@ pthread_mutex_t *lock_for_init() {
     return mutex;
 }
 
-// Returns null and locks nothing before the first init.
+// Locks and returns the lock. Before the first init, returns null and locks nothing.
 pthread_mutex_t *lock_for_deinit() {
     pthread_mutex_t *mutex = load_pointer(&tavo_jni_mutex);
     if (mutex != nullptr) pthread_mutex_lock(mutex);
@@ -109,7 +110,7 @@ void delete_host(JNIEnv *env, host_refs *host) {
     free(host);
 }
 
-// Releases one use of the references. The last user deletes them.
+// Gives back one use of the references. The last user deletes them.
 void release_host(JNIEnv *env, host_refs *host) {
     if (host == nullptr) return;
     pthread_mutex_lock(&host_mutex);
@@ -118,13 +119,13 @@ void release_host(JNIEnv *env, host_refs *host) {
     if (last) delete_host(env, host);
 }
 
-// Returns null if memory runs out.
+// Creates the references with a use count of 1. Returns null if memory runs out.
 host_refs *create_host(JNIEnv *env, jclass host_class, jobject obj) {
     auto *host = static_cast<host_refs *>(calloc(1, sizeof(host_refs)));
     if (host == nullptr) return nullptr;
     host->users = 1;
     host->host_class = static_cast<jclass>(env->NewGlobalRef(host_class));
-    // If the first call failed, an exception is pending, and NewGlobalRef must not be called again.
+    // If the first call failed, an exception is pending, and NewGlobalRef must not be called.
     if (host->host_class != nullptr && obj != nullptr) host->object = env->NewGlobalRef(obj);
     if (host->host_class == nullptr || (obj != nullptr && host->object == nullptr)) {
         delete_host(env, host);
@@ -143,7 +144,8 @@ jmethodID find_post_event(JNIEnv *env, jclass host_class) {
     return method;
 }
 
-// Returns false, with the exception cleared, if the class or its event method is missing.
+// Stores the event method of the host's class. Returns false, with the exception cleared, if the
+// class or the method is missing.
 bool look_up_host(JNIEnv *env) {
     jclass host_class = env->FindClass(kHostClass);
     const bool found = host_class != nullptr && find_post_event(env, host_class) != nullptr;
@@ -152,7 +154,7 @@ bool look_up_host(JNIEnv *env) {
     return found;
 }
 
-// Called with the lock held. The path is read only during the call.
+// Opens an instance. Called with the lock held. The path is read only during this call.
 TAVO_CTX *create_instance(const char *path, jint mode, int32_t *err) {
     init_param.path = path;
     init_param.mode = mode;
@@ -161,8 +163,8 @@ TAVO_CTX *create_instance(const char *path, jint mode, int32_t *err) {
     return ctx;
 }
 
-// Called with the lock held. Stores the handle last, because analyze, which takes no lock, may use
-// it at once.
+// Connects a new instance to the host. Called with the lock held. Stores the handle last, because
+// analyze takes no lock and may use the handle at once.
 jint adopt_instance(JNIEnv *env, TAVO_CTX *ctx) {
     if (!look_up_host(env)) {
         tavo_deinit(ctx);
@@ -183,7 +185,8 @@ jint init_failed(jint code) {
     return code;
 }
 
-// Called with the lock held. chars: the characters of path, or null; released here.
+// Called with the lock held, or inside an event while an instance is open. `chars` holds the
+// characters of `path`, or is null, and is released here.
 jint init_locked(JNIEnv *env, jstring path, const char *chars, jint mode) {
     const bool is_open = load_pointer(&instance) != nullptr;
     int32_t err = TAVO_ERR_HANDLE;
@@ -230,7 +233,7 @@ jint attach_thread(Vm *vm, jint (Vm::*attach)(Env **, void *), JNIEnv **env) {
     return result;
 }
 
-// Returns the environment of this thread, which is attached if necessary. Null on failure.
+// Returns the environment of this thread, which is attached if necessary, or null on failure.
 JNIEnv *environment(JavaVM *vm, bool *attached_here) {
     void *current = nullptr;
     if (vm->GetEnv(&current, JNI_VERSION_1_6) == JNI_OK) return static_cast<JNIEnv *>(current);
@@ -244,8 +247,8 @@ void notification_failed(JNIEnv *env) {
     env->ExceptionClear();
 }
 
-// Returns a local reference; null, with the exception cleared, if the virtual machine is out of
-// memory.
+// Copies the beats to a Java array and returns a local reference to it. Returns null, with the
+// exception cleared, if the virtual machine is out of memory.
 jfloatArray copy_beats(JNIEnv *env, const TAVO_INFO *info) {
     jfloatArray beats = env->NewFloatArray(info->beat_count);
     if (beats == nullptr) {
@@ -265,8 +268,8 @@ void post(JNIEnv *env, const host_refs *host, jmethodID method, const TAVO_INFO 
 
     env->CallStaticVoidMethod(host->host_class, method, host->object, event, info->hl_pos, count,
                               beats);
-    // The thread may have been attached before and go on afterwards, so no local reference may be
-    // left.
+    // The thread may have been attached earlier and may stay attached, so delete the local
+    // reference.
     if (beats != nullptr) env->DeleteLocalRef(beats);
     if (env->ExceptionCheck() == JNI_TRUE) notification_failed(env);
 }
@@ -291,7 +294,7 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobje
     }
     host_refs *host = create_host(env, host_class, obj);
     env->DeleteLocalRef(host_class);
-    if (host == nullptr) {  // out of memory: the earlier references stay
+    if (host == nullptr) {  // out of memory: keep the earlier references
         env->ExceptionClear();
         return;
     }
@@ -306,7 +309,7 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject /*thiz
                                                      jint mode) {
     const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
     if (chars == nullptr) env->ExceptionClear();
-    // Inside an event the lock may be held by a deinit that waits for this thread.
+    // Inside an event, the lock may be held by a deinit that waits for this thread.
     const bool takes_lock = !is_posting() || load_pointer(&instance) == nullptr;
     pthread_mutex_t *mutex = takes_lock ? lock_for_init() : nullptr;
     const jint result = init_locked(env, path, chars, mode);
@@ -350,7 +353,7 @@ JNIEXPORT jboolean JNICALL Java_com_kestu_tavo_Tavo_isComplete(JNIEnv * /*env*/,
 JNIEXPORT jstring JNICALL Java_com_kestu_tavo_Tavo_reason(JNIEnv *env, jclass /*host*/,
                                                           jstring path) {
     const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
-    if (path != nullptr && chars == nullptr) return nullptr;  // the exception is pending
+    if (path != nullptr && chars == nullptr) return nullptr;  // an exception is pending
     const int32_t code = tavo_probe(chars, nullptr);
     if (chars != nullptr) env->ReleaseStringUTFChars(path, chars);
     return code != TAVO_OK ? env->NewStringUTF(tavo_error_text(code)) : nullptr;
@@ -372,11 +375,11 @@ void tavocallback(TAVO_INFO *info) {
         mark_posting(pthread_self());
         post(env, host, method, info);
         mark_posting({});
-    } else {  // no class is stored, or it has no event method
+    } else {  // the class or its event method is missing
         notification_failed(env);
     }
     release_host(env, host);
-    // A thread that ends while attached aborts Android's runtime and keeps a desktop one from
+    // A thread that ends while attached aborts Android's runtime and keeps a desktop runtime from
     // exiting.
     if (attached_here) vm->DetachCurrentThread();
 }

@@ -1,8 +1,8 @@
 // Stage 8: the Java bridge.
 //
-// Input: the native methods of com.kestu.tavo.Tavo, for one instance per process. Output: one call
-// of the class's static postEventFromNative per job, on the job's worker thread. Follows
-// include/tavo.h; precedes java/com/kestu/tavo/Tavo.java.
+// Input: calls of the native methods of com.kestu.tavo.Tavo, for one instance per process. Output:
+// one call of the static method postEventFromNative per job, on the job's worker thread. Follows
+// include/tavo.h and precedes java/com/kestu/tavo/Tavo.java.
 #ifndef TAVO_JNI_TAVO_JNI_H
 #define TAVO_JNI_TAVO_JNI_H
 
@@ -13,32 +13,33 @@
 
 extern "C" {
 
-// Serialises init and deinit, which hold it until they return. Null until the first init; never
-// destroyed.
+// Serialises init and deinit, which hold it until they return. It is null until the first init and
+// is never destroyed.
 extern pthread_mutex_t *tavo_jni_mutex;
 
-// Stores the virtual machine. Returns JNI_VERSION_1_6; JNI_ERR (-1) if the machine does not support
-// it.
+// Stores the virtual machine. Returns JNI_VERSION_1_6, or JNI_ERR (-1) if the virtual machine does
+// not support that version.
 JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *vm, void *reserved);
 
-// Stores global references to the class of thiz and to obj, the first argument of every event.
-// Deletes those of an earlier call. Changes nothing on failure.
+// Stores global references to the class of `thiz` and to `obj`, the first argument of every event.
+// Deletes the references of an earlier call. Changes nothing on failure.
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobject thiz,
                                                               jobject obj);
 
-// Returns TAVO_OK; TAVO_ERR_BUSY if an instance exists, whatever the path, with nothing changed;
-// TAVO_ERR_MEMORY; TAVO_ERR_HANDLE if the path is null, the file cannot be used, or the class has
-// no postEventFromNative. After a failure no instance exists.
+// Opens a file. Returns TAVO_OK; TAVO_ERR_BUSY, with nothing changed, if an instance already
+// exists, whatever the path; TAVO_ERR_MEMORY; or TAVO_ERR_HANDLE if the path is null, the file
+// cannot be used, or the class lacks postEventFromNative. After the last two errors, no instance
+// exists.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject thiz, jstring path,
                                                      jint mode);
 
-// Takes no lock; the host calls it on the thread that calls init and deinit. Returns 0 if the job
-// was started or no instance exists; -1 if it was not started.
+// Starts the job. Takes no lock, because the host calls it on the thread that calls init and
+// deinit. Returns 0 if the job was started or no instance exists, -1 if the job was not started.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *env, jobject thiz, jint hl_param,
                                                         jint max_beats, jint beat_param2);
 
 // Stops a running job and waits until its event has returned. Returns 0 if the instance was
-// released or did not exist; -1 inside the event, with nothing changed.
+// released or did not exist, or -1, with nothing changed, inside the event.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *env, jobject thiz);
 
 // Static. Sets fnamedec (include/tavo.h) to an empty path, so that no click track is written.
@@ -47,14 +48,15 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *env, j
 // True if the job of the open instance decoded the file to its end (tavo_is_complete).
 JNIEXPORT jboolean JNICALL Java_com_kestu_tavo_Tavo_isComplete(JNIEnv *env, jobject thiz);
 
-// Static. Returns the reason why a file cannot be analysed (tavo_probe) in words, or null if it
-// can.
+// Static. Returns the reason why a file cannot be analysed (tavo_probe) in words, or null if it can
+// be.
 JNIEXPORT jstring JNICALL Java_com_kestu_tavo_Tavo_reason(JNIEnv *env, jclass host, jstring path);
 
 // The callback of the bridge's instances. Posts exactly one event: (object, 1, hl_pos, beat_count,
 // float[beat_count] or null) for a result, (object, 2, hl_pos, 0, null) for a failure. If the
-// virtual machine has no memory for the array, a result becomes a failure. Attaches the thread for
-// the call if necessary. Before init it looks up the method in the stored class.
+// virtual machine has too little memory for the array, a result becomes a failure. Attaches the
+// thread for the call if necessary. If init has not stored the event method, looks it up in the
+// stored class.
 void tavocallback(TAVO_INFO *info);
 }
 
