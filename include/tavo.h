@@ -57,9 +57,9 @@
 
 #include <stdint.h>
 
-#define TAVO_VERSION_MAJOR 1 /**< changes break programs */
-#define TAVO_VERSION_MINOR 0 /**< changes add functions */
-#define TAVO_VERSION_PATCH 0 /**< changes leave the declarations alone */
+#define TAVO_VERSION_MAJOR 1 /**< raised by changes that break programs */
+#define TAVO_VERSION_MINOR 0 /**< raised by changes that add functions */
+#define TAVO_VERSION_PATCH 0 /**< raised by other changes */
 
 #ifdef __cplusplus
 extern "C" {
@@ -77,7 +77,7 @@ enum {
     TAVO_OK = 0,             /**< done or started */
     TAVO_ERR_BUSY = -1,      /**< the Java bridge already holds an instance */
     TAVO_ERR_MEMORY = -2,    /**< out of memory, or a thread could not be started */
-    TAVO_ERR_FORMAT = -3,    /**< unusable file: format, stream parameters, length, rate */
+    TAVO_ERR_FORMAT = -3,    /**< unusable format, stream parameters, length or rate */
     TAVO_ERR_HANDLE = -4,    /**< bad handle or argument; from tavo_init: the file is unusable */
     TAVO_ERR_NOT_READY = -5, /**< the job of the instance has already been started */
     TAVO_ERR_READ = -6,      /**< a media source could not read or decode */
@@ -95,7 +95,7 @@ enum {
     TAVO_MAX_RATE = 48000     /**< highest sample rate, except for FLAC, Hz */
 };
 
-/** The loudness curve: one value per hop, measured over a window that starts there. */
+/** The loudness curve: one value per hop, measured over a window that starts with that hop. */
 enum {
     TAVO_LOUDNESS_HOP_MS = 2000,   /**< from the start of one window to the start of the next */
     TAVO_LOUDNESS_WINDOW_MS = 6000 /**< length of a window */
@@ -103,7 +103,7 @@ enum {
 
 /** Margins of the highlight search: values at the ends of the curve that are not searched. */
 enum {
-    TAVO_SHORT_SONG_S = 90,     /**< songs of fewer seconds have narrower margins */
+    TAVO_SHORT_SONG_S = 90,     /**< seconds; shorter songs have narrower margins */
     TAVO_SEARCH_SKIP = 9,       /**< values at the start; 0 in a short song */
     TAVO_SEARCH_TAIL = 25,      /**< values at the end */
     TAVO_SHORT_SEARCH_TAIL = 10 /**< values at the end of a short song */
@@ -163,7 +163,7 @@ const char *tavo_error_text(int32_t code);
 
 /** Opens the file, reads its format and plans the decoding.
  *
- * Only one instance may exist in a process, and the caller must ensure it: a second tavo_init
+ * Only one instance may exist in a process, and the caller must ensure this: a second tavo_init
  * before the tavo_deinit of the first succeeds, but the two share their locks and may wait forever.
  *
  * Returns the instance, owned by the caller until tavo_deinit, with *err 0. On failure returns
@@ -172,13 +172,13 @@ const char *tavo_error_text(int32_t code);
  * was too little memory. */
 TAVO_CTX *tavo_init(const TAVO_PARAM *param, int32_t *err);
 
-/** Stores the callback. Call it before tavo_analyze. Checks nothing. */
+/** Stores the callback. Call it before tavo_analyze. The handle is not checked. */
 void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback);
 
-/** Stores a listener instead of a callback, and the pointer to pass to it, which the library
- * does not read. Call it before tavo_analyze, on an instance that tavo_init returned. The last
- * call of tavo_setcallback or tavo_set_listener counts. A null listener removes it. Returns 0;
- * -4 for a bad handle, with nothing stored. */
+/** Stores a listener instead of a callback, and a pointer that is passed to the listener but not
+ * otherwise used. Call it before tavo_analyze, on an instance that tavo_init returned. The last
+ * call of tavo_setcallback or tavo_set_listener counts. A null listener removes the stored one.
+ * Returns 0, or -4 for a bad handle, with nothing stored. */
 int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 
 /** Starts the one job of the instance on its own thread and returns immediately.
@@ -187,7 +187,8 @@ int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
  * - beat_param2: not used.
  *
  * Returns 0 if started; -2 if the thread could not be started (the instance stays ready); -4 for a
- * bad handle or a mode outside 0 to 2; -5 if already started. Only a 0 leads to a callback. */
+ * bad handle or a mode outside 0 to 2; -5 if already started. A callback follows only if the result
+ * is 0. */
 int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_beats, int32_t beat_param2);
 
 /** Stops a running job, waits until its callback has returned, and releases the instance. Decoding
@@ -219,8 +220,8 @@ int32_t tavo_is_complete(const TAVO_CTX *ctx);
 
 /** Returns the loudness curve of the file, once a job of mode 0 or 2 has ended. Value i is
  * measured over the window that starts at i * TAVO_LOUDNESS_HOP_MS. It is 10 * log10(m + 1),
- * where m is the mean square of the samples with full scale 1.0: 0 for silence, 3.01 for a
- * square wave at full scale. The curve has *count values and is valid until tavo_deinit.
+ * where m is the mean square of the samples if full scale is 1.0. This gives 0 for silence and
+ * 3.01 for a full-scale square wave. The curve has *count values and is valid until tavo_deinit.
  * Returns null with *count 0 before the end of the job, in mode 1, for audio shorter than a
  * window, or for a bad handle. count must not be null. */
 const float *tavo_get_loudness(const TAVO_CTX *ctx, int32_t *count);

@@ -16,9 +16,9 @@ import java.lang.ref.WeakReference;
  * <p><b>One analysis in a process.</b> All objects of this class share one native analysis, and the
  * object that was created last receives the events: create one object and keep it.
  *
- * <p><b>Order.</b> {@code init}, {@code analyze} once, the event once, {@code deinit}; then
- * {@code init} again for the next file. {@code deinit} is allowed at any time after {@code init}.
- * It stops a running job, whose event still arrives before {@code deinit} returns.
+ * <p><b>Order.</b> Call {@code init}, then {@code analyze} once. After the event, call {@code
+ * deinit}, then {@code init} for the next file. {@code deinit} is allowed at any time after
+ * {@code init}. It stops a running job, whose event still arrives before {@code deinit} returns.
  *
  * <p><b>Threads.</b> Call {@code init}, {@code analyze} and {@code deinit} from one thread, or from
  * several that take turns. {@code init} reads from the file and {@code deinit} waits for a running
@@ -26,7 +26,7 @@ import java.lang.ref.WeakReference;
  *
  * <p><b>Lifetime.</b> The library holds this object by a weak reference. Keep your own reference
  * until the event has arrived, or the event is lost. Only {@code deinit} releases the native
- * analysis; if an object is lost before its {@code deinit}, the next object's does.
+ * analysis: if an object is lost first, call {@code deinit} on the next one.
  *
  * <p><b>Click track.</b> The modes with beats write a diagnostic WAV file into the working
  * directory unless {@link #disableClickTrack} was called. On Android the working directory is not
@@ -91,10 +91,10 @@ public final class Tavo implements AutoCloseable {
     public static native String reason(String path);
 
     /**
-     * Returns true if the analysis decoded the file to its end. Valid from the event until
-     * {@link #deinit}. If it did not, the event is a failure.
+     * Returns true if the analysis decoded the file to its end. Otherwise the event is a
+     * failure. The value is valid from the event until {@link #deinit}.
      *
-     * @return false also before the event, after a stop, and without {@link #init}
+     * @return true if so; false otherwise, before the event, after a stop or without {@link #init}
      */
     public native boolean isComplete();
 
@@ -108,7 +108,7 @@ public final class Tavo implements AutoCloseable {
      *     {@link #ERROR_UNUSABLE}
      * @param mode one of the modes above
      * @return 0, {@link #ERROR_BUSY}, {@link #ERROR_MEMORY} or {@link #ERROR_UNUSABLE}; an error
-     *     changes nothing, and {@link #reason} returns its reason
+     *     changes nothing, and {@link #reason} explains it
      */
     public native int init(String path, int mode);
 
@@ -119,8 +119,8 @@ public final class Tavo implements AutoCloseable {
      * @param maxBeats maximum number of threshold-selected beats, 0 for no limit; not used in
      *     {@link #MODE_HIGHLIGHT}
      * @param reserved not used, 0
-     * @return 0 if started, -1 if not (it was started before); also 0 without {@code init}, when
-     *     nothing happens and no event follows
+     * @return 0 if started; -1 if not, for instance because it was started before; also 0 without
+     *     {@code init}, but then nothing happens and no event follows
      */
     public native int analyze(int highlightSeconds, int maxBeats, int reserved);
 
@@ -142,7 +142,7 @@ public final class Tavo implements AutoCloseable {
      * and signature.
      *
      * @param ref the argument of {@code native_setup}
-     * @param what 1 a result, 2 a failure
+     * @param what 1 for a result, 2 for a failure
      * @param arg1 start of the highlight, milliseconds
      * @param arg2 number of beats
      * @param beats the beat times in milliseconds, or null

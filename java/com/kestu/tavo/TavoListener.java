@@ -1,12 +1,12 @@
 package com.kestu.tavo;
 
 /**
- * Receives the result of an analysis: exactly one call of one of these methods.
+ * Receives the result of an analysis through exactly one call of one of these methods.
  *
  * <p>Both methods run on a thread of the library, never on the thread that called
  * {@link Tavo#analyze}. Pass the values to your own thread before you touch a user interface.
- * Return soon, and do not call {@link Tavo#deinit}, which returns -1 there. If a method throws an
- * exception, the library logs that and ignores it.
+ * Return quickly, and do not call {@link Tavo#deinit}, which returns -1 there. If a method throws
+ * an exception, the library logs it and goes on.
  */
 public interface TavoListener {
     /**
