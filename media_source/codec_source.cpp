@@ -11,19 +11,19 @@ struct decoding {
     const codec_source *source;
     wexa_output output;
     wexa_status status;
-    bool failed_before;  // the previous decode of this call
+    bool failed_before;  // the previous frame of this call could not be decoded
 };
 
 void *stream_of(const codec_source &source, const mtsrc_ctx *src) {
     return source.container->close_stream != nullptr ? src->dstream : src->demux;
 }
 
-// Checks a byte count of the codec library, which is another binary.
+// Checks a byte count from the codec library, which is a separate binary and may be wrong.
 bool is_possible(int32_t bytes, int32_t capacity) {
     return bytes >= 0 && bytes <= capacity;
 }
 
-// Queues the PCM of the last decoded frame.
+// Reduces the PCM of the last decoded frame to one channel and queues it.
 int32_t queue_decoded(mtsrc_ctx *src, const decoding &call, int64_t first) {
     const int32_t bytes = call.output.bytes;
     if (!is_possible(bytes, src->q_room + call.source->codec->spare_bytes)) return TAVO_ERR_READ;
@@ -64,7 +64,7 @@ void free_buffer(void **buffer) {
     *buffer = nullptr;
 }
 
-// Frees the buffers only; the codec library owns the record.
+// Frees only the buffers; the codec library owns the record.
 void free_tag_buffers(wexa_tags *tags) {
     for (wexa_tag_text &text : tags->text) free_buffer(&text.data);
     for (wexa_tag_entry &entry : tags->entry) {

@@ -1,4 +1,4 @@
-// Maps a type code of recognition to its format source. Called by mtsrc.cpp.
+// Maps a type code of recognition to the operations of its format source. Called by mtsrc.cpp.
 #ifndef TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
 #define TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
 
@@ -13,7 +13,7 @@ struct format_ops {
     int32_t (*reset)(mtsrc_ctx *src);
 };
 
-// Returns null for a type without a format source.
+// Returns the operations, or null if no format source reads files of this type.
 const format_ops *format_ops_of(int32_t type);
 
 #endif

@@ -20,7 +20,7 @@ mtsrc_ctx *new_handle(const mtsrc_io *io) {
     auto *src = static_cast<mtsrc_ctx *>(calloc(1, sizeof(mtsrc_ctx)));
     if (src == nullptr) return nullptr;
     src->q_cap = kQueueBytes;
-    // Zeroed, because a byte count may include an incomplete last sample, which is not written.
+    // Zeroed, because the queue may count an incomplete last sample whose bytes are never written.
     src->q_base = static_cast<uint8_t *>(calloc(1, kQueueBytes + kQueueSpareBytes));
     if (src->q_base == nullptr || pthread_mutex_init(&src->lock, nullptr) != 0) {
         free(src->q_base);
@@ -33,8 +33,8 @@ mtsrc_ctx *new_handle(const mtsrc_io *io) {
     return src;
 }
 
-// Opens and recognises the file and stores its format source in the handle. Returns 0,
-// TAVO_ERR_FORMAT, TAVO_ERR_READ or TAVO_ERR_OPEN.
+// Opens and recognises the file, and stores the operations of its format source in the handle.
+// Returns 0, TAVO_ERR_FORMAT, TAVO_ERR_READ or TAVO_ERR_OPEN.
 int32_t choose_source(mtsrc_ctx *src) {
     mtsrc_file *file = src->io.open(&src->io, kReadOnly);
     if (file == nullptr) return TAVO_ERR_OPEN;
@@ -53,7 +53,7 @@ int32_t choose_source(mtsrc_ctx *src) {
     return TAVO_OK;
 }
 
-// Releases a handle whose open failed. The caller keeps the path.
+// Releases a handle that could not be opened. The caller still owns the path.
 void discard(mtsrc_ctx *src) {
     pthread_mutex_destroy(&src->lock);
     if (src->close != nullptr) src->close(src);
@@ -108,7 +108,7 @@ mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t /*flags*/, int32_t *err) 
 
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt) {
     if (!is_open(src) || fmt == nullptr) return TAVO_ERR_HANDLE;
-    // Copied field by field, because the padding after bits belongs to the caller.
+    // Copied field by field to leave the padding after `bits` as the caller set it.
     fmt->sample_rate = src->format.sample_rate;
     fmt->channels = src->format.channels;
     fmt->bits = src->format.bits;

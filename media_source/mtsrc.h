@@ -1,10 +1,10 @@
 /// @file
-/// Stage 1: turns an audio file into a stream of 16-bit mono PCM. The caller reads it in requests
-/// of any size and seeks by time.
+/// Stage 1: decodes an audio file into a stream of 16-bit mono PCM. Callers read any number of
+/// bytes at a time and seek by time.
 ///
-/// Input: a path. Output: PCM at the stream's own rate, native byte order. Called by pcm/decode.h.
-/// A source is used by one thread at a time; different sources share nothing. The handle,
-/// mtsrc_init, mtsrc_getstream and mtsrc_deinit are declared in tavo.h.
+/// Input: a path. Output: PCM at the stream's own sample rate, in native byte order. Called by
+/// pcm/decode.h. A source is used by one thread at a time; different sources share nothing. The
+/// handle, mtsrc_init, mtsrc_getstream and mtsrc_deinit are declared in tavo.h.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_H
 #define TAVO_MEDIA_SOURCE_MTSRC_H
 
@@ -21,8 +21,8 @@ struct mtsrc_format {
 static_assert(offsetof(mtsrc_format, duration) == 16);
 
 // Results other than 0 and the negative codes of tavo.h.
-constexpr int32_t kMtsrcEndOfStream = 1;  ///< mtsrc_getstream: delivered what was left
-constexpr int32_t kMtsrcDone = -5;        ///< success of mtsrc_reset and mtsrc_deinit
+constexpr int32_t kMtsrcEndOfStream = 1;  ///< mtsrc_getstream delivered all that was left
+constexpr int32_t kMtsrcDone = -5;        ///< mtsrc_reset or mtsrc_deinit succeeded
 
 // Type codes returned by recognition.
 constexpr int32_t kMtsrcTypeMp4 = 2000;        ///< MP4
@@ -40,15 +40,15 @@ extern "C" {
 
 /// Opens a file through the caller's callbacks, which are copied. On success the handle owns
 /// io->path and releases it with free; on failure the caller still owns it. Reports errors as
-/// mtsrc_init does. flags: unused, pass 0.
+/// mtsrc_init does. `flags` is unused; pass 0.
 mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t flags, int32_t *err);
 
-/// Returns 0, or -4 for a bad handle or a null fmt.
+/// Stores the stream's format in *fmt. Returns 0, or -4 for a bad handle or a null pointer.
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt);
 
-/// Seeks to `position` (100-ns units). The reader stores in *reached where reading resumes. Set
-/// *reached before the call, because a reader may leave it unchanged. Returns 0, or -4 for a bad
-/// handle or a failed seek; after a failed seek the queue is empty.
+/// Seeks to `position` (100-ns units). The reader stores in *reached the position at which reading
+/// resumes. Initialise *reached, because a reader may leave it unchanged. Returns 0, or -4 for a
+/// bad handle or a failed seek; after a failed seek the queue is empty.
 int32_t mtsrc_seekstream(mtsrc_ctx *src, int64_t position, int64_t *reached);
 
 /// Empties the queue and resets the decoder. Returns -5 on success, -4 for a bad handle.
@@ -58,9 +58,8 @@ int32_t mtsrc_reset(mtsrc_ctx *src);
 /// (to kMtsrcTypeUnknown if no probe matches), or returns -6 if 16 bytes cannot be read.
 int32_t mtsrc_get_file_type(const mtsrc_io *io, mtsrc_file *file, int32_t *type);
 
-/// The probes, in the order in which they are called. head: the first 16 bytes of the file. They
-/// restore the file offset, whatever it is, and use only read, tell, seek and skip of io. Return a
-/// type code.
+/// The probes, in calling order. `head` holds the first 16 bytes of the file. Each probe returns a
+/// type code and restores the file offset. It uses only the callbacks read, tell, seek and skip.
 /// @{
 int32_t mtsrc_probe_asf(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 int32_t mtsrc_probe_mp4(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);

@@ -1,6 +1,7 @@
-// The source handle. Only mtsrc.cpp and the format sources know its fields.
+// The source handle. Only mtsrc.cpp and the format sources use its fields.
 //
-// mtsrc.cpp allocates it, recognises the file and calls the format through the five operations.
+// mtsrc.cpp allocates the handle, recognises the file and calls its format source through the five
+// operations.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_CTX_H
 #define TAVO_MEDIA_SOURCE_MTSRC_CTX_H
 
@@ -9,9 +10,9 @@
 #include "include/tavo.h"
 #include "media_source/mtsrc.h"
 
-constexpr int32_t kQueueBytes = 1'048'576;  // q_cap
-// Extra bytes allocated after q_cap. The largest FLAC block decodes to 262,140 bytes of stereo, but
-// only 131,070 free bytes, its size in mono, are guaranteed before each frame.
+constexpr int32_t kQueueBytes = 1'048'576;  // value of q_cap
+// Extra bytes allocated past q_cap. The largest FLAC block decodes to 262,140 bytes of stereo, but
+// before each frame the queue guarantees only the 131,070 bytes that the block needs in mono.
 constexpr int32_t kQueueSpareBytes = 131'070;
 
 // Codec codes of the codec library. A decoder receives one with each compressed frame.
@@ -20,19 +21,19 @@ constexpr int32_t kCodecAac = 306;
 constexpr int32_t kCodecFlac = 322;
 constexpr int32_t kCodecVorbis = 323;
 
-// The queue holds 16-bit mono PCM. q_base <= q_rd <= q_wr; q_fill = q_wr - q_rd; q_room = q_cap -
-// (q_wr - q_base).
+// The queue holds 16-bit mono PCM. These relations always hold: q_base <= q_rd <= q_wr, q_fill =
+// q_wr - q_rd and q_room = q_cap - (q_wr - q_base).
 struct mtsrc_ctx {
-    uint32_t mark;  // "KOVA" in memory order when the source is open
+    uint32_t mark;  // "KOVA", in memory order, while the source is open
     int32_t (*open)(mtsrc_ctx *src);
     void (*close)(mtsrc_ctx *src);
     int32_t (*get_frm)(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
     int32_t (*seek)(mtsrc_ctx *src, int64_t position, int64_t *reached);
     int32_t (*reset)(mtsrc_ctx *src);
     mtsrc_io io;             // the path buffer is owned
-    mtsrc_file *probe_file;  // opened for recognition, stays open, owned
+    mtsrc_file *probe_file;  // owned; opened for recognition and kept open
     mtsrc_format format;
-    int32_t codec;    // the type code; after the open, the stream's codec code
+    int32_t codec;    // the file's type code; once open, the stream's codec code
     void *demux;      // reader or demuxer, owned
     void *dstream;    // demuxer's stream (MP4, Ogg), owned
     void *decoder;    // owned; null for WAV
@@ -53,10 +54,10 @@ static_assert(sizeof(void *) != 8 || offsetof(mtsrc_ctx, lock) == 280);
 
 extern "C" {
 
-// The five operations of each format source. open creates the reader and the decoder, fills the
+// The five operations of each format source. open creates the reader and the decoder, fills in the
 // handle and returns 0, TAVO_ERR_HANDLE, TAVO_ERR_FORMAT, TAVO_ERR_OPEN or TAVO_ERR_CODEC. close
-// accepts a handle whose open failed. get_frm, seek and reset are the bodies of mtsrc_getstream,
-// mtsrc_seekstream and mtsrc_reset; reset returns 0.
+// accepts a handle whose open failed. get_frm, seek and reset implement mtsrc_getstream,
+// mtsrc_seekstream and mtsrc_reset, except that reset returns 0.
 int32_t mtsource_wav_open(mtsrc_ctx *src);
 void mtsource_wav_close(mtsrc_ctx *src);
 int32_t mtsource_wav_get_frm(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
@@ -97,7 +98,8 @@ int32_t mtsource_ogg_reset(mtsrc_ctx *src);
 // it; -1 on failure.
 int32_t aac_get_hz(void *reader, void *decoder);
 
-// Index of the first audio track or stream, or -1. info: an xmp4_info or an xogg_info.
+// Return the index of the first audio track or stream, or -1. `info` is an xmp4_info or an
+// xogg_info, respectively.
 int32_t get_mp4_audiostream(const void *info);
 int32_t get_ogg_audiostream(const void *info);
 }

@@ -37,15 +37,15 @@ mtsrc_file *mtsrc_file_open(const mtsrc_io *io, int32_t mode) {
         free(file);
         return nullptr;
     }
-    // A duplicate shares its offset with the original. For a pipe this fails, and so does the first
-    // tell.
+    // A duplicated descriptor shares its offset with the original. On a pipe this call fails, and
+    // recognition then fails too.
     lseek64(file->fd, 0, SEEK_SET);
     return file;
 }
 
 int32_t mtsrc_file_close(mtsrc_file *file) {
     if (file == nullptr) return kFailed;
-    // Not repeated after EINTR, because the descriptor is closed already.
+    // Not repeated after EINTR, because even then the descriptor is closed.
     const int result = file->fd == -1 ? 0 : close(file->fd);
     free(file);
     return result == 0 ? 0 : kFailed;

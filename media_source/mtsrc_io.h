@@ -1,7 +1,6 @@
 /// @file
-/// File access of stage 1: callbacks that a media source passes to the format probes and to the
-/// codec library, which opens and reads the file through them. Another binary reads this record, so
-/// its layout is fixed.
+/// File access of stage 1. The format probes and the codec library access the file only through the
+/// callbacks of a record. The codec library is a separate binary, so the record's layout is fixed.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_IO_H
 #define TAVO_MEDIA_SOURCE_MTSRC_IO_H
 
@@ -10,7 +9,7 @@
 
 struct mtsrc_io;
 
-/// An open file. open allocates it, close frees it.
+/// An open file. mtsrc_io.open allocates it, and mtsrc_io.close frees it.
 struct mtsrc_file {
     int32_t fd;  ///< -1 if not open
 };
@@ -19,12 +18,12 @@ struct mtsrc_file {
 struct mtsrc_io {
     mtsrc_file *(*open)(const mtsrc_io *io, int32_t mode);        ///< bit 0 of mode: read-write
     int32_t (*close)(mtsrc_file *file);                           ///< 0 or -1
-    int64_t (*read)(mtsrc_file *file, void *buf, int32_t count);  ///< bytes read, 0 end, -1
-    int64_t (*write)(mtsrc_file *file, const void *buf, int32_t count);  ///< bytes written, -1
+    int64_t (*read)(mtsrc_file *file, void *buf, int32_t count);  ///< bytes; 0 at the end; or -1
+    int64_t (*write)(mtsrc_file *file, const void *buf, int32_t count);  ///< bytes or -1
     int32_t (*tell)(mtsrc_file *file, int64_t *offset);                  ///< 0 or -1
     int32_t (*seek)(mtsrc_file *file, const int64_t *offset);            ///< absolute; 0 or -1
     int32_t (*skip)(mtsrc_file *file, const int64_t *distance);          ///< forward, >= 1; 0 or -1
-    int32_t (*size)(mtsrc_file *file, int64_t *length);  ///< offset unchanged; 0 or -1
+    int32_t (*size)(mtsrc_file *file, int64_t *length);  ///< keeps the offset; 0 or -1
     uint64_t reserved_64;                                ///< 0
     int32_t fd;               ///< descriptor to duplicate when path is "fd"
     int32_t reserved_76;      ///< 0
@@ -38,13 +37,14 @@ static_assert(sizeof(void *) != 8 || (offsetof(mtsrc_io, path) == 88 && sizeof(m
 
 extern "C" {
 
-/// Opens io->path (or duplicates io->fd if the path is "fd") at offset 0. Returns a new handle, or
-/// null on failure. mode bit 0: 0 read-only, 1 read-write, created with permissions 0644.
+/// Opens io->path, or duplicates io->fd if the path is "fd", and moves to offset 0. Returns a new
+/// handle, or null on failure. If bit 0 of `mode` is set, the file is opened for reading and
+/// writing, and created with permissions 0644 if it does not exist. Otherwise it is read-only.
 mtsrc_file *mtsrc_file_open(const mtsrc_io *io, int32_t mode);
 
-/// Callbacks for files of mtsrc_file_open; see the field of the same name in mtsrc_io. A read or
-/// write is one system call, repeated only if a signal interrupts it. It may transfer fewer bytes
-/// than count.
+/// Callbacks for files that mtsrc_file_open opened; mtsrc_io describes what they return. A read or
+/// write makes one system call, repeated only if a signal interrupts it, so it may transfer fewer
+/// than `count` bytes.
 /// @{
 int32_t mtsrc_file_close(mtsrc_file *file);
 int64_t mtsrc_file_read(mtsrc_file *file, void *buf, int32_t count);

@@ -23,7 +23,7 @@ void deliver(mtsrc_ctx *src, int32_t bytes, mtsrc_frame *frame) {
     src->q_fill -= bytes;
 }
 
-// Returns 0 if the queue holds `want` bytes, otherwise the code that ends the call.
+// Returns 0 once the queue holds `want` bytes, otherwise the code that ends the read.
 int32_t fill_queue(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_fill &fill) {
     int32_t empty_steps = 0;
     while (src->q_fill < want) {
@@ -40,8 +40,8 @@ int32_t fill_queue(mtsrc_ctx *src, int32_t want, uint8_t *frame_buf, const pcm_f
     return TAVO_OK;
 }
 
-constexpr int32_t kChunkFrames =
-    64;  // sample frames per chunk, a fixed number so that the loops are vectorised
+// Sample frames per chunk, a constant so that the compiler vectorises the loops.
+constexpr int32_t kChunkFrames = 64;
 
 struct left_of {
     static void reduce(const int16_t *stereo, int16_t *mono) {
@@ -61,7 +61,8 @@ struct mean_of {
     }
 };
 
-// The body of pcm_first_channel and pcm_mean_of_two. Each chunk is read before it is written.
+// Implements pcm_first_channel and pcm_mean_of_two. Copies each chunk before writing its result,
+// because `dst` may equal `pcm`.
 template <typename reduction>
 int32_t reduce_pcm(uint8_t *dst, const uint8_t *pcm, int32_t bytes, int32_t channels) {
     if (channels <= 1) {

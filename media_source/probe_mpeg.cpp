@@ -15,7 +15,7 @@ constexpr int32_t kMinFrameBytes = 5;
 constexpr int64_t kTransportPacketBytes = 188;
 constexpr uint8_t kTransportSync = 0x47;
 
-// Header fields as the file stores them.
+// Values of the header fields as the file stores them.
 constexpr int32_t kVersion25 = 0;
 constexpr int32_t kVersionReserved = 1;
 constexpr int32_t kVersion1 = 3;
@@ -23,7 +23,7 @@ constexpr int32_t kLayerReserved = 0;
 constexpr int32_t kLayer3 = 1;
 constexpr int32_t kLayer2 = 2;
 constexpr int32_t kLayer1 = 3;
-constexpr int32_t kTypeLessLayerBits = 306;  // minus the layer bits: the type code
+constexpr int32_t kTypeLessLayerBits = 306;  // minus the layer bits, this gives the type code
 
 struct frame_header {
     int32_t version;
@@ -33,7 +33,7 @@ struct frame_header {
     bool padded;
 };
 
-// Parses the first three bytes of a header. Returns false if no header starts with them.
+// Parses the first three bytes of a header. Returns false if they cannot start a header.
 bool parse(const uint8_t *bytes, frame_header *header) {
     *header = {(bytes[1] >> 3) & 3, (bytes[1] >> 1) & 3, bytes[2] >> 4, (bytes[2] >> 2) & 3,
                (bytes[2] & 2) != 0};
@@ -61,7 +61,8 @@ int32_t hertz(const frame_header &header) {
     return kRates[header.version][header.rate];
 }
 
-// Bytes of a frame without padding; 0 if the layer and version have none.
+// Returns the length of a frame in bytes, without padding; 0 for Layers I and II of version 2.5,
+// which has only Layer III.
 int32_t frame_length(const frame_header &header) {
     const int32_t bits = 1000 * kilobits(header);
     switch (header.layer) {
@@ -119,7 +120,7 @@ int32_t try_candidate(const scan &s, int32_t at) {
 
 int32_t run_scan(scan *s) {
     if (!refill(s)) return kMtsrcTypeUnknown;
-    uint32_t window = 0;  // the four bytes up to index k
+    uint32_t window = 0;  // the last four bytes, up to index k
     for (int32_t k = 0; k < s->got; ++k) {
         window = window << 8 | s->buf[k];
         if (window >= 0x49443302 && window <= 0x49443304) {  // "ID3", version 2 to 4
@@ -141,7 +142,7 @@ bool has_transport_sync(const mtsrc_io *io, mtsrc_file *file) {
     return io->seek(file, &offset) == 0 && io->read(file, &byte, 1) == 1 && byte == kTransportSync;
 }
 
-// True if the head belongs to another kind of stream. May move the file offset.
+// True if the file is an MPEG transport or program stream. May move the file offset.
 bool is_other_container(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file,
                         const int64_t *start) {
     constexpr uint8_t kPackHeader[4] = {0, 0, 1, 0xBA};

@@ -9,7 +9,7 @@ namespace {
 
 using probe = int32_t (*)(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 
-// In the order in which they are called: quick tests of the head first, the scan of a large block
+// The probes in calling order: the quick tests of the head come first, the scan of a large block
 // last.
 constexpr probe kProbes[] = {mtsrc_probe_asf, mtsrc_probe_mp4, mtsrc_probe_flac, mtsrc_probe_ogg,
                              mtsrc_probe_wav, mtsrc_probe_aac, mtsrc_probe_mpeg};
@@ -87,7 +87,7 @@ int32_t mtsrc_probe_aac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *fil
     uint8_t bytes[7];
     if (!peek_after_tag(head, io, file, bytes, sizeof bytes)) return kMtsrcTypeUnknown;
     if (is_at(bytes, 0, "ADIF")) return kMtsrcTypeAac;
-    // The ADTS sync word with layer 0: either MPEG version, with or without a checksum.
+    // The ADTS sync word and layer 0, for both MPEG versions, with and without a checksum.
     switch (bytes[0] << 8 | bytes[1]) {
         case 0xFFF0:
         case 0xFFF1:

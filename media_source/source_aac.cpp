@@ -1,4 +1,4 @@
-// Bare AAC, as ADTS or ADIF.
+// Format source of bare AAC streams in ADTS or ADIF form.
 #include <cstdlib>
 
 #include "media_source/codecs.h"

@@ -1,9 +1,9 @@
-// FLAC.
+// Format source of FLAC files.
 #include "media_source/codec_source.h"
 
 namespace {
 
-// Sets the flag in the reader's state before each read.
+// Sets the flag byte in the reader's state, then reads.
 int32_t get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                 int64_t *second) {
     static_cast<uint8_t *>(reader)[kFlacReaderFlag] = 1;

@@ -1,4 +1,4 @@
-// Bare MPEG audio, Layers I to III.
+// Format source of bare MPEG audio streams, Layers I to III.
 #include <algorithm>
 #include <cstring>
 
@@ -12,7 +12,7 @@ constexpr int32_t kDelayRate = 44'100;  // Hz
 constexpr int32_t kDelayChannels = 2;
 constexpr int32_t kDelayBytes = kWexaMpegDelay * kDelayChannels * 2;
 
-// Reduces a frame to the mean of its first two channels, without the delay.
+// Reduces a frame to the mean of its first two channels. Drops the delay from the first frame.
 int32_t reduce(const mtsrc_ctx *src, int32_t bytes, int64_t first) {
     const bool delayed = src->format.channels == kDelayChannels &&
                          src->format.sample_rate == kDelayRate && first == 0;

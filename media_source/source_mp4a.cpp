@@ -1,4 +1,4 @@
-// AAC or MPEG Layer III in MP4. The first audio track determines the codec.
+// Format source of MP4 files whose first audio track is AAC or MPEG Layer III.
 #include <algorithm>
 
 #include "media_source/codecs.h"
@@ -6,7 +6,7 @@
 namespace {
 
 int32_t init() {
-    // If the second call fails, the first is undone when the handle is closed.
+    // If the second call fails, closing the handle undoes the first.
     const int32_t result = xaac_init();
     return result != 0 ? result : xmp123_init();
 }
@@ -29,7 +29,7 @@ constexpr container_ops kMp4 = {
 };
 constexpr codec_source kAacInMp4 = {&kMp4, &kAacCodec, codec_source_reduce_to_first};
 constexpr codec_source kMpegInMp4 = {&kMp4, &kMpegCodec, codec_source_reduce_to_first};
-// For other codecs, which have no decoder: delivers only what is in the queue.
+// Used for any other codec. Without a decoder it delivers only what is already in the queue.
 constexpr codec_source kOtherInMp4 = {&kMp4, nullptr, codec_source_reduce_to_first};
 
 const codec_source &source_of(const mtsrc_ctx *src) {

@@ -1,4 +1,5 @@
-// Vorbis in Ogg. The decoder is created with the stream's set-up data and outputs one channel.
+// Format source of Ogg files with Vorbis. The decoder receives the set-up data before the first
+// frame and outputs one channel.
 #include <algorithm>
 #include <cstdlib>
 
@@ -6,7 +7,7 @@
 
 namespace {
 
-constexpr int32_t kMaxSetupBytes = 1 << 24;  // code books take some kilobytes
+constexpr int32_t kMaxSetupBytes = 1 << 24;  // real codebooks take a few kilobytes
 constexpr int32_t kVorbisChannels = 1;       // of the decoder's output
 
 int32_t seek(void *stream, const int64_t *position, int64_t *reached) {

@@ -1,13 +1,15 @@
-// The interface of the codec library, libwexaaudio.so: readers, demuxers and frame decoders for the
-// format sources of stage 1. It is a contract, not an implementation. Another binary reads the
-// records, so each offset is asserted.
+// The interface of the codec library, libwexaaudio.so: the readers, demuxers and frame decoders
+// that the format sources of stage 1 use. The library is a separate binary, so the layout of every
+// record is asserted.
 //
-// Readers open the file through the callbacks of mtsrc_io. Results are 0 on success,
-// kWexaEndOfStream at the end, anything else on failure. Times are in 100-ns units unless stated
-// otherwise. Objects of different sources are used on different threads at the same time.
+// Readers open the file through the callbacks of mtsrc_io. Numeric results are 0 on success,
+// kWexaEndOfStream at the end of the stream, and any other value on failure. Times are in 100-ns
+// units unless stated otherwise. Different sources use their objects on different threads at the
+// same time.
 //
-// A "frame" is what a library's reader passes to its own decoder: compressed bytes, or PCM that the
-// reader has already decoded and the decoder copies. A source depends only on its byte count.
+// A "frame" is whatever the library's reader passes to its own decoder: compressed bytes, or PCM
+// that the reader has already decoded and the decoder only copies. A source looks only at the byte
+// count.
 #ifndef TAVO_MEDIA_SOURCE_WEXAAUDIO_H
 #define TAVO_MEDIA_SOURCE_WEXAAUDIO_H
 
@@ -20,13 +22,13 @@ constexpr int32_t kWexaPcm = 300;      // codec code of linear PCM
 constexpr int32_t kWexaKindAudio = 1;  // kind of an audio track or stream
 constexpr int32_t kWexaTagAac = 0xFF;  // WAVE format tags of MP4 tracks
 constexpr int32_t kWexaTagMpegLayer3 = 0x55;
-constexpr int32_t kWexaEndOfStream = 1;  // result of a read
-// Sample pairs that the MPEG source drops at the start of a 44.1-kHz stereo stream. A reader's
-// duration and positions count only what the source delivers.
+constexpr int32_t kWexaEndOfStream = 1;  // result of a read past the last frame
+// Sample pairs that the MPEG source drops at the start of a 44.1-kHz stereo stream. The durations
+// and positions of a reader do not include them.
 constexpr int32_t kWexaMpegDelay = 529;
 
-// Tags of a file, or a null pointer. The library owns the record. Its buffers come from malloc; the
-// source frees them without reading them.
+// The tags of a file. A library that reads no tags stores a null pointer instead. The library owns
+// the record; its buffers come from malloc, and the source frees them without reading them.
 struct wexa_tag_text {
     uint64_t reserved_0;
     void *data;
@@ -38,9 +40,9 @@ struct wexa_tag_entry {
     uint8_t reserved_16[80];
 };
 struct wexa_tags {
-    wexa_tag_text text[9];  // pointers at 8, 32, ... 200
+    wexa_tag_text text[9];  // the pointers are at offsets 8, 32, ... 200
     uint8_t reserved_216[24];
-    wexa_tag_entry entry[16];  // pointers at 240 + 96 i and 248 + 96 i
+    wexa_tag_entry entry[16];  // the pointers are at offsets 240 + 96 i and 248 + 96 i
     uint64_t reserved_1776;
     void *last;
 };
@@ -161,7 +163,7 @@ static_assert(sizeof(void *) != 8 || sizeof(xogg_stream) == 32);
 // Decoder configuration.
 struct wexa_config {
     int32_t word_0;            // 1
-    int32_t output_channels;   // 0: same as the stream
+    int32_t output_channels;   // 0 for as many as the stream has
     int32_t bytes_per_sample;  // 2
     int32_t word_3;            // 0
 };
@@ -188,7 +190,7 @@ static_assert(sizeof(void *) != 8 ||
               (offsetof(wexa_frame, bytes) == 16 && offsetof(wexa_frame, codec) == 24));
 static_assert(sizeof(void *) != 8 || sizeof(wexa_frame) == 96);
 
-// Output of a decoder: bytes of interleaved 16-bit PCM at data, a buffer that the caller owns.
+// Output of a decoder: interleaved 16-bit PCM in a buffer that the caller owns.
 struct wexa_output {
     uint8_t reserved_0[32];
     int32_t bytes;
@@ -201,7 +203,7 @@ static_assert(sizeof(void *) != 8 ||
 static_assert(sizeof(void *) != 8 || sizeof(wexa_output) == 272);
 
 struct wexa_status {
-    int32_t produced;  // not 0 if the decoder wrote PCM
+    int32_t produced;  // nonzero if the decoder wrote PCM
     int32_t reserved_4[7];
 };
 static_assert(sizeof(void *) != 8 || sizeof(wexa_status) == 32);
@@ -218,14 +220,15 @@ constexpr size_t kFlacReaderFlag = 2096;
 
 extern "C" {
 
-// WAV: chunks of interleaved PCM. seek takes whole seconds and stores 100-ns units in *reached.
+// WAV. Frames are chunks of interleaved PCM. A seek takes whole seconds but stores 100-ns units in
+// *reached.
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t *word);
 int32_t xwavd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first,
                       int64_t *second);
 int32_t xwavd_seek(void *reader, const int64_t *seconds, int64_t *reached, int32_t flags);
 void xwavd_delete(void *reader);
 
-// AAC in ADTS or ADIF form; a library may support only one of them. create: reserved is null.
+// AAC in ADTS or ADIF form; a library may support only one of the two. `reserved` is always null.
 int32_t xaac_init(void);
 void xaac_deinit(void);
 void *xaacfd_create(const mtsrc_io *io, int64_t *word, xaac_info *info, void *reserved);
@@ -268,7 +271,7 @@ int32_t xmp123d_decode(void *decoder, const wexa_frame *frame, wexa_output *outp
 void xmp123d_reset(void *decoder);
 void xmp123d_delete(void *decoder);
 
-// MP4: a demuxer, and a stream of one of its tracks.
+// MP4: a demuxer, and a stream for one of its tracks.
 void *xmp4fd_create(const mtsrc_io *io, int32_t *word, xmp4_info *info, void *reserved);
 void xmp4fd_delete(void *demux);
 void *xmp4fds_open(void *demux, int32_t track, void *reserved);
@@ -278,8 +281,8 @@ int32_t xmp4fds_get_frm(void *stream, void *buf, int32_t size, int32_t *bytes, i
                         int64_t *second);
 int32_t xmp4fds_seek(void *stream, const int64_t *position, int64_t *reached, int32_t flags);
 
-// Ogg and Vorbis. get_format stores the length of the set-up data if buf is null; otherwise it
-// copies the data.
+// Ogg and Vorbis. xoggds_get_format stores the length of the set-up data in *length. If `buf` is
+// not null, it also copies the data there.
 void *xoggd_create(const mtsrc_io *io, int64_t *word, xogg_info *info, void *reserved);
 void xoggd_delete(void *demux);
 void *xoggds_open(void *demux, int32_t index, void *reserved);
