@@ -24,13 +24,13 @@ char priority_letter(int prio) {
 extern "C" int __android_log_print(int prio, const char *tag, const char *fmt, ...) {
     if (prio < lowest_priority()) return 0;
 
-    char text[1024];  // cuts longer messages, as the device's log does
+    char text[1024];  // longer messages are cut off, as on a device
     va_list args;
     va_start(args, fmt);
     vsnprintf(text, sizeof(text), fmt, args);
     va_end(args);
 
-    // A message may end in a newline. Print one line in any case.
+    // Drops the newlines at the end of a message, so that each message is one line.
     size_t length = strlen(text);
     while (length > 0 && text[length - 1] == '\n') --length;
     fprintf(stderr, "%c/%s: %.*s\n", priority_letter(prio), tag, static_cast<int>(length), text);

@@ -1,5 +1,5 @@
-// The decoders of all codecs. The readers have already decoded, so a frame is PCM, and decoding
-// copies it. See shared/stream.h.
+// The decoders of all codecs. The readers deliver PCM as frames, so decoding a frame only copies
+// it. See shared/stream.h.
 #include <cstdlib>
 #include <cstring>
 
@@ -11,10 +11,10 @@ namespace {
 constexpr int32_t kSampleBytes = 2;
 
 struct copy_decoder {
-    int32_t rate;  // Hz, as configured; AAC only
+    int32_t rate;  // configured sample rate, Hz; only for AAC
 };
 
-// channels: number of channels that the codec's readers deliver; any other is refused.
+// Refuses any output_channels other than `channels`, which is what the codec's readers deliver.
 copy_decoder *create(const wexa_config *config, int32_t channels) {
     if (config->bytes_per_sample != kSampleBytes || config->output_channels != channels) {
         return nullptr;
@@ -61,7 +61,7 @@ int32_t xaacd_decode(void * /*decoder*/, const wexa_frame *frame, wexa_output *o
     return 0;
 }
 
-// The set-up data comes first, with no output buffer.
+// The first call passes the set-up data and no output buffer.
 int32_t xvorbisd_decode(void *decoder, const wexa_frame *frame, wexa_output *output,
                         wexa_status *status) {
     if (output->data != nullptr) return xaacd_decode(decoder, frame, output, status);

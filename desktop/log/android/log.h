@@ -1,7 +1,7 @@
-/* The Android log's writing function for a desktop. It writes priority letter, tag and message
- * to standard error. By default it writes errors (priority 6) only; the environment variable
- * TAVO_LOG selects a lower priority ("verbose", "debug"). On Android the platform's own header
- * and library replace this. */
+/* Android's log function for desktops. It writes the priority letter, the tag and the message to
+ * standard error. By default it writes only errors (priority 6 and above); set the environment
+ * variable TAVO_LOG to "verbose" or "debug" for more. On Android the platform's own header and
+ * library are used instead. */
 #ifndef TAVO_DESKTOP_LOG_ANDROID_LOG_H
 #define TAVO_DESKTOP_LOG_ANDROID_LOG_H
 
@@ -18,7 +18,7 @@ enum {
     ANDROID_LOG_FATAL = 7
 };
 
-/* printf-like. Returns 1 if the line was written, 0 if its priority is too low. */
+/* Formats like printf. Returns 1 if the line was written, 0 if its priority is too low. */
 __attribute__((format(printf, 3, 4))) int __android_log_print(int prio, const char *tag,
                                                               const char *fmt, ...);
 

@@ -1,6 +1,6 @@
-// AAC in ADTS form, after any ID3v2 tags: one scan of the frame headers at open finds every frame.
+// Reads AAC in ADTS form. Opening a file scans its frame headers, after any ID3v2 tags.
 //
-// In: mtsrc_io. Out: PCM, the information record.
+// Input: mtsrc_io. Output: PCM and the information record. Precedes copy_decoder.cpp.
 #include <cstring>
 
 #include "desktop/wexaaudio/aac/aac_stream.h"
@@ -22,7 +22,7 @@ struct adts_header {
     int32_t bytes;  // of the compressed frame
 };
 
-// False if there is no header, or if it announces several raw blocks without their lengths.
+// Parses the header at `offset`. Returns false if it is invalid or states several raw blocks.
 bool header_at(io_file *file, int64_t offset, adts_header *h) {
     const uint8_t *p = io_file_bytes(file, offset, kHeaderBytes);
     if (p == nullptr || p[0] != 0xFF || (p[1] & 0xF6) != 0xF0) return false;
@@ -34,18 +34,17 @@ bool header_at(io_file *file, int64_t offset, adts_header *h) {
     return h->bytes >= h->head && aac_rate_of_index(h->rate_index) > 0 && (p[6] & 3) == 0;
 }
 
-// True if both frames may belong to one stream. The number of channels may change within a stream,
-// as in a broadcast; the decoder adapts.
+// True if both frames may belong to the same stream. The channel count may change within a stream,
+// for example in a broadcast; the decoder adapts to it.
 bool same_stream(const adts_header &a, const adts_header &b) {
     return a.object_type == b.object_type && a.rate_index == b.rate_index;
 }
 
-// Finds the next frame of the stream at or after offset. Another frame or the end of the file must
-// follow it immediately. reference: a frame of the stream, or null for any stream. Returns the
-// offset, or -1.
+// Returns the offset of the next frame at or after `offset`, or -1. Another frame or the end of the
+// file must follow it immediately. `reference` is a frame of the wanted stream, or null.
 int64_t find_frame(io_file *file, int64_t offset, const adts_header *reference, adts_header *h) {
     for (;; ++offset) {
-        int32_t got = 0;  // large enough for the longest frame and the next header
+        int32_t got = 0;
         const uint8_t *p = io_file_peek(file, offset, kMaxFrameBytes + kHeaderBytes, &got);
         if (p == nullptr) return -1;
         const void *sync = memchr(p, 0xFF, static_cast<size_t>(got));
@@ -63,7 +62,7 @@ int64_t find_frame(io_file *file, int64_t offset, const adts_header *reference, 
     }
 }
 
-// Finds every complete frame. *first receives the header of the first one.
+// Adds every complete frame to the index and stores the header of the first one in *first.
 bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header *first) {
     offset = find_frame(file, offset, nullptr, first);
     adts_header h = *first;
@@ -74,7 +73,8 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
         if (header_at(file, end, &next) && same_stream(next, *first)) {
             offset = end;
         } else {
-            // Damage. If the stated length is wrong, the next header may be inside this frame.
+            // The file is damaged. If the length is wrong, the next header may be inside this
+            // frame.
             offset = find_frame(file, offset + h.head, first, &next);
             frame_entry &last = frames->entry[frames->count - 1];
             if (offset >= 0 && offset < end) {
@@ -86,8 +86,8 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
     return frames->count > 0 && !file->failed;
 }
 
-// Makes the configuration from the first frame's header or, if the header does not state the
-// channels, from its raw block.
+// Makes the configuration from the first frame's header and, if that does not state the channels,
+// from its raw block.
 bool make_config(io_file *file, const adts_header &first, const frame_entry &entry,
                  aac_config *config) {
     aac_config_make(config, first.object_type, first.rate_index, first.channels);

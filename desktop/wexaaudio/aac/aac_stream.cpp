@@ -9,38 +9,39 @@ namespace {
 constexpr int32_t kRates[] = {96000, 88200, 64000, 48000, 44100, 32000, 24000,
                               22050, 16000, 12000, 11025, 8000,  7350};
 constexpr int32_t kRateCount = sizeof kRates / sizeof kRates[0];
-constexpr int32_t kMixdownBits[] = {4, 4, 3};  // mono, stereo, matrix mixdown
+constexpr int32_t kMixdownBits[] = {4, 4, 3};  // of the mono, stereo and matrix mixdown fields
 constexpr int32_t kIdentifierBits = 3;         // of an element in a raw block
-constexpr int32_t kPlainBytes = 2;             // of a configuration without more elements
+constexpr int32_t kPlainBytes = 2;             // of a configuration without a program element
 constexpr int32_t kRateEscape = 15;            // the rate follows in 24 bits
 constexpr int32_t kObjectEscape = 31;          // 6 more bits follow
 
-// With spectral band replication the output has twice the core rate, at most 48,000 Hz.
+// Spectral band replication doubles the core rate, to at most 48,000 Hz.
 constexpr int32_t kMaxSbrCore = 24000;
-constexpr int32_t kSbrFrames = 8;  // frames decoded to find band replication; usually all have it
+constexpr int32_t kSbrFrames = 8;     // frames searched for band replication; usually all have it
 constexpr int32_t kTriedFrames = 64;  // frames tried until one can be decoded
 
-constexpr int32_t kMaxFrameSamples = 4096;  // as 16-bit pairs, well within a source's frame buffer
-constexpr int32_t kMaxBlockBytes = 8191;    // limit of an ADTS header, beyond any real block
+constexpr int32_t kMaxFrameSamples = 4096;  // 16 KiB of PCM, well within a source's frame buffer
+constexpr int32_t kMaxBlockBytes = 8191;  // limit of the ADTS length field; real blocks are smaller
 
-// A decoder's noise generator is stateful, so each group of frames has a fresh decoder. Opening a
-// decoder costs as much as decoding several frames, which favours large groups. A seek decodes half
-// a group on average, which favours small ones.
+// A decoder's noise generator is stateful, so each group of frames starts with a fresh decoder.
+// Opening a decoder costs as much as decoding several frames, which favours large groups. A seek
+// decodes half a group on average, which favours small ones.
 //
-// For low complexity one frame covers the overlap. Band replication has filters and envelopes with
-// a longer memory, and its header may occur only in every tenth frame; with a preroll of 8 frames
-// the difference is audible. Other object types use prediction, which has a longer memory, too.
+// In low-complexity AAC, one earlier frame covers the overlap. Band replication needs more: its
+// filters and envelopes have a longer memory, and its header may occur only in every tenth frame.
+// With a preroll of 8 frames the difference is audible. Prediction, which other object types use,
+// also has a longer memory.
 constexpr int32_t kGroup = 256;
 constexpr int32_t kPreroll = 1;
 constexpr int32_t kLongPreroll = 12;
 
 struct bit_reader {
     const uint8_t *data;
-    int64_t bits;  // in data
+    int64_t bits;  // size of data
     int64_t at;    // exceeds `bits` after a read past the end
 };
 
-// Bits past the end are 0.
+// Reads the next `count` bits. Bits past the end are 0.
 uint32_t get(bit_reader *r, int32_t count) {
     uint32_t value = 0;
     for (const int64_t end = r->at + count; r->at < end; ++r->at) {
@@ -64,7 +65,7 @@ uint32_t put(bit_writer *w, uint32_t value, int32_t count) {
     return value;
 }
 
-// Copies count bits and returns them.
+// Copies `count` bits and returns them.
 uint32_t copy(bit_reader *r, bit_writer *w, int32_t count) {
     return put(w, get(r, count), count);
 }
@@ -80,11 +81,11 @@ void put_general(bit_writer *w, const aac_config &config) {
     put(w, 0, 2);  // no core coder, no extension
 }
 
-// States explicitly that the stream has spectral band replication and, if parametric, stereo from
-// one channel. Otherwise a decoder that starts at a frame without such data would never apply it.
-// Leaves a configuration unchanged unless its object type is low complexity.
+// Adds spectral band replication and, if `parametric`, parametric stereo to the configuration.
+// Otherwise a decoder that starts at a frame without such data would never apply it. Does nothing
+// unless the object type is low complexity.
 void state_sbr(aac_config *config, bool parametric) {
-    // The output's rate is twice the core's, which is three entries up in the table.
+    // Twice the core's rate is three entries up in the table.
     const int32_t extension = config->rate_index - 3;
     if (config->object_type != kAacLowComplexity || config->channels == 0 ||
         aac_rate_of_index(extension) != 2 * aac_rate_of_index(config->rate_index)) {
@@ -122,7 +123,7 @@ block_output decode_alone(io_file *file, const aac_config *config, const frame_e
     return got;
 }
 
-// Decodes the first frames and returns the output with the highest rate.
+// Decodes the first frames. Returns the format of the output with the highest rate.
 block_output find_output(io_file *file, const aac_config *config, const frame_index *frames) {
     block_output best = {};
     const int32_t core_rate = aac_rate_of_index(config->rate_index);

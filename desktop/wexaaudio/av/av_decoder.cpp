@@ -1,4 +1,4 @@
-// libwexaaudio_av.so, which calls libavcodec. See shared/codec_library.h.
+// The code that calls libavcodec, built as libwexaaudio_av.so. See shared/codec_library.h.
 #include <pthread.h>
 
 #include <algorithm>
@@ -24,11 +24,11 @@ struct av_decoder {
 
 namespace {
 
-constexpr size_t kMaxBlock = size_t{128} << 20;  // most bytes that libavutil allocates at once
+constexpr size_t kMaxBlock = size_t{128} << 20;  // largest single allocation by libavutil, bytes
 
 pthread_once_t prepare_once = PTHREAD_ONCE_INIT;
 
-// For the whole process: no messages on standard error, no huge allocations for damaged counts.
+// Turns off libavcodec's messages and limits its allocations, for the whole process.
 void prepare() {
     av_log_set_level(AV_LOG_QUIET);
     av_max_alloc(kMaxBlock);
@@ -76,7 +76,7 @@ av_decoder *open_decoder(const char *name, const uint8_t *setup, int32_t setup_b
     return nullptr;
 }
 
-// Returns the packet's data. The packet's buffer is reused unless libavcodec still refers to it.
+// Returns the packet's data. Reuses the packet's buffer unless libavcodec still refers to it.
 uint8_t *make_packet(av_decoder *d, int32_t bytes) {
     AVPacket *packet = d->packet;
     const size_t needed = static_cast<size_t>(bytes) + AV_INPUT_BUFFER_PADDING_SIZE;
@@ -90,7 +90,7 @@ uint8_t *make_packet(av_decoder *d, int32_t bytes) {
     return packet->data;
 }
 
-// True if the frame has samples as planar floats, the format of all decoders used here.
+// True if the frame contains planar floats, the output format of all decoders used here.
 bool is_audio(const AVFrame *frame) {
     return frame->nb_samples >= 0 && frame->ch_layout.nb_channels >= 1 &&
            frame->format == AV_SAMPLE_FMT_FLTP;
@@ -101,8 +101,8 @@ int32_t decode(av_decoder *d) {
     int result = avcodec_send_packet(d->ctx, d->packet);
     if (result == 0) result = avcodec_receive_frame(d->ctx, d->frame);
     if (result == AVERROR(EAGAIN)) return 0;
-    // A damaged packet may contain several frames. The others must not be output with the next
-    // packet.
+    // A damaged packet may yield several frames. Discard all except the first, so that they do not
+    // appear in the next packet's output.
     while (result == 0 && avcodec_receive_frame(d->ctx, d->spare) == 0) av_frame_unref(d->spare);
     if (result == 0 && is_audio(d->frame)) return d->frame->nb_samples;
     av_frame_unref(d->frame);

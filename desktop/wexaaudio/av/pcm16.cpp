@@ -5,21 +5,21 @@
 
 namespace {
 
-// Four samples in one register, using the compiler's vector extension.
+// Vectors of four samples, using the compiler's vector extension.
 typedef float float_quad __attribute__((vector_size(16)));
 typedef int32_t int_quad __attribute__((vector_size(16)));
 typedef uint32_t bits_quad __attribute__((vector_size(16)));
 constexpr ptrdiff_t kQuad = 4;
-static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__);  // two samples share a word
+static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__);  // for the pairs of pcm16_pair
 
 constexpr float kScale = 32768.0f;
 
-// Adding 1.5 x 2^23 leaves the nearest integer (ties to even, as lrintf) in the low bits of a float
-// whose magnitude is below 2^22.
+// Adding 1.5 x 2^23 to a float whose magnitude is below 2^22 leaves the nearest integer (ties to
+// even, like lrintf) in the low bits of the sum.
 constexpr float kRoundMagic = 12582912.0f;
 constexpr int32_t kRoundMagicBits = 0x4B400000;
 
-// Converts the first `count` samples, 1 to kQuad, to integers of 16 bits; the other lanes are 0.
+// Converts `count` samples, from 1 to kQuad, to 16-bit integers. The other lanes are 0.
 inline int_quad round_clip(const float *samples, ptrdiff_t count) {
     constexpr float_quad kMost = {32767.0f, 32767.0f, 32767.0f, 32767.0f};
     float_quad in = {};
@@ -34,7 +34,7 @@ inline int_quad round_clip(const float *samples, ptrdiff_t count) {
     return bits - kRoundMagicBits;
 }
 
-// Calls step(i, samples) for each quad of `count` samples and for the remainder.
+// Calls step(first index, number of samples) for each group of four samples and for the rest.
 template <typename Step>
 inline void for_quads(ptrdiff_t count, Step step) {
     ptrdiff_t i = 0;

@@ -1,8 +1,8 @@
-// FLAC files, decoded by libFLAC. Positions come from the frames' sample numbers, so a missing or
-// undecodable frame becomes silence of its length.
+// Reads FLAC files with libFLAC. Positions come from the frames' sample numbers, so a missing or
+// undecodable frame becomes silence of the same length.
 //
-// In: mtsrc_io. Out: 16-bit pairs of front left and right, or of a single channel twice; the
-// information record.
+// Input: mtsrc_io. Output: the information record and 16-bit stereo PCM, which is front left and
+// right or a single channel twice. Precedes copy_decoder.cpp.
 #include <FLAC/stream_decoder.h>
 
 #include <algorithm>
@@ -16,14 +16,14 @@
 
 namespace {
 
-constexpr int32_t kPair = 2 * sizeof(int16_t);  // frames, or 0 if there are no groups
-constexpr int64_t kTail = 65'536;               // bytes decoded first to find the last block
+constexpr int32_t kPair = 2 * sizeof(int16_t);  // bytes
+constexpr int64_t kTail = 65'536;  // bytes at the file's end, searched first for the last block
 
-// Maximum plausible number of sample frames per byte of the file. Digital silence has 290 in the
-// encoder's default blocks of 4096, and 1200 in the largest blocks of a streamable file.
+// Largest plausible number of sample frames per byte of the file. Digital silence reaches 290 in
+// the encoder's default blocks of 4096, and 1200 in the largest blocks of a streamable file.
 constexpr int64_t kMaxSamplesPerByte = 2048;
 
-// One pass through the blocks of a file.
+// A libFLAC decoder and the block that it decoded last.
 struct flac_stream {
     io_file *file;
     FLAC__StreamDecoder *decoder;  // owned
@@ -33,7 +33,7 @@ struct flac_stream {
     int16_t *pcm;                  // [max_block][2] owned; the last decoded block
     int64_t block;                 // first sample of the block
     int32_t count;                 // sample frames of the block, or 0
-    bool damaged;                  // the current frame has a wrong check sum
+    bool damaged;                  // the current frame has a wrong checksum
 };
 
 struct flac_reader {
@@ -43,7 +43,7 @@ struct flac_reader {
     flac_stream stream;
     const stream_info *info;  // shared by the readers of the file
     int64_t next;             // next sample to deliver
-    bool moved;               // a seek was requested, and the decoder has not followed
+    bool moved;               // a seek was requested, but the decoder has not moved yet
 };
 static_assert(offsetof(flac_reader, flag) == kFlacReaderFlag);
 
@@ -62,7 +62,7 @@ FLAC__StreamDecoderReadStatus read_bytes(const FLAC__StreamDecoder * /*decoder*/
                     : FLAC__STREAM_DECODER_READ_STATUS_CONTINUE;
 }
 
-// Stores a block as 16-bit pairs.
+// Converts a block to 16-bit pairs.
 void store_pairs(const FLAC__int32 *left, const FLAC__int32 *right, int32_t bits, int32_t count,
                  int16_t *pcm) {
     const auto store = [&](auto convert) {
@@ -73,14 +73,14 @@ void store_pairs(const FLAC__int32 *left, const FLAC__int32 *right, int32_t bits
     };
     const int32_t up = 16 - bits;
     if (up >= 0) return store([=](FLAC__int32 x) { return static_cast<uint32_t>(x) << up; });
-    const int32_t half = 1 << (bits - 17);  // rounds to nearest, halves up; clips at the top
+    const int32_t half = 1 << (bits - 17);  // rounds to nearest, ties up; clips at the top
     store([&](FLAC__int32 x) {
         return std::min((x >> (bits - 16)) + ((x & half) != 0 ? 1 : 0), 32767);
     });
 }
 
-// Stores a decoded frame as the block. Ignores a frame with a wrong check sum, because even its
-// number may be wrong.
+// Stores a decoded frame as the current block. Ignores a frame with a wrong checksum, because even
+// its sample number may be wrong.
 FLAC__StreamDecoderWriteStatus store_block(const FLAC__StreamDecoder * /*decoder*/,
                                            const FLAC__Frame *frame,
                                            const FLAC__int32 *const buffer[], void *client) {
@@ -139,7 +139,7 @@ void close_stream(flac_stream *s) {
     free(s->pcm);
 }
 
-// Decodes the next usable block. False if no further block can be read.
+// Decodes the next usable block. Returns false at the end of the stream and on failure.
 bool decode_block(flac_stream *s) {
     s->count = 0;
     while (s->count == 0) {
@@ -150,16 +150,16 @@ bool decode_block(flac_stream *s) {
     return true;
 }
 
-// Decodes the block that contains a sample, starting at that sample. False on failure.
+// Seeks to a sample and decodes its block from there on. Returns false on failure.
 bool find_sample(flac_stream *s, int64_t sample) {
     s->count = 0;
     s->damaged = false;
     const auto number = static_cast<FLAC__uint64>(s->base + sample);
-    return FLAC__stream_decoder_flush(s->decoder) != 0 &&  // leaves the state of a failed seek
+    return FLAC__stream_decoder_flush(s->decoder) != 0 &&  // recovers from a failed seek
            FLAC__stream_decoder_seek_absolute(s->decoder, number) != 0 && s->count > 0;
 }
 
-// End of the last block that begins at or after an offset in the file, or 0.
+// Returns the end, in samples, of the last block that starts at or after a file offset, or 0.
 int64_t last_end(flac_stream *s, int64_t offset) {
     s->damaged = false;
     s->at = offset;
@@ -173,8 +173,8 @@ int64_t last_end(flac_stream *s, int64_t offset) {
     return end;
 }
 
-// Finds the end of the audio, which may differ from the stream information: the end of the last
-// block, searched from the end of the file. False if no plausible end is found.
+// Finds the end of the last block, which is where the audio really ends, by searching from the end
+// of the file. Returns false if no plausible end is found.
 bool find_end(flac_stream *s, int64_t *end) {
     const int64_t size = s->file->size;
     for (int64_t tail = kTail; *end == 0 && !s->file->failed; tail *= 4) {
@@ -182,7 +182,7 @@ bool find_end(flac_stream *s, int64_t *end) {
         if (tail >= size) break;
     }
     const auto stated = static_cast<int64_t>(FLAC__stream_decoder_get_total_samples(s->decoder));
-    if (stated > 0) *end = std::min(*end, stated);  // else it is unknown
+    if (stated > 0) *end = std::min(*end, stated);  // 0 means unknown
     return !s->file->failed && *end > 0 && *end / kMaxSamplesPerByte <= size;
 }
 
@@ -222,7 +222,7 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     flac_stream *s = &r->stream;
     if (r->next >= r->info->end) return kWexaEndOfStream;
     if (r->moved && !find_sample(s, r->next)) {
-        // If seeking fails, the stream is read from the start up to the position.
+        // If the seek fails, the stream is decoded from its start up to the position.
         r->file.failed = false;
         s->count = 0;
         if (FLAC__stream_decoder_reset(s->decoder) == 0) return -1;
@@ -232,7 +232,7 @@ int32_t xflacfd_get_frm(void *reader, void *buf, int32_t size, int32_t *bytes, i
     bool more = true;
     while (more && (s->count == 0 || s->block + s->count <= r->next)) more = decode_block(s);
     if (r->file.failed) return -1;
-    const int64_t inside = r->next - s->block;  // below 0 in the silence before the block
+    const int64_t inside = r->next - s->block;  // negative in silence before the block
     const int64_t left = std::min<int64_t>(r->info->end - r->next, size / kPair);
     const int64_t samples = std::min(left, !more ? left : inside < 0 ? -inside : s->count - inside);
     *bytes = static_cast<int32_t>(samples) * kPair;

@@ -9,11 +9,11 @@
 namespace {
 
 constexpr int32_t kMaxBoxes = 65536;    // in one level; real files have far fewer
-constexpr int64_t kFullHead = 4;        // bytes: version and flags, if a box has them
+constexpr int64_t kFullHead = 4;        // bytes: version and flags of a full box
 constexpr int64_t kMaxTable = 1 << 26;  // bytes; a day of audio needs less
 
-// Minimum plausible number of bytes of the file per frame. The shortest AAC frame of silence has 4
-// bytes, plus 4 in the tables. Without this limit, frames that share their bytes would take
+// Smallest plausible number of file bytes per frame. The shortest AAC frame of silence takes 4
+// bytes, and 4 more in the tables. Without this limit, frames that share their bytes could take
 // unlimited memory.
 constexpr int64_t kMinFrameBytes = 2;
 
@@ -23,11 +23,11 @@ constexpr uint32_t name_of(const char (&text)[5]) {
     return name;
 }
 
-// Offsets of the contents of a box, or of a level of boxes. If from == to, it does not exist.
+// File offsets of the contents of a box, or of a level of boxes. Both are 0 for a missing box.
 struct span {
     int64_t from;
     int64_t to;
-    int32_t boxes = 0;  // read from the level so far
+    int32_t boxes = 0;  // number of boxes read from the level so far
 };
 
 struct box {
@@ -36,7 +36,7 @@ struct box {
     span body;
 };
 
-// Size of a track's frames in fragments that do not state it.
+// A track's frame size for fragments that do not state one.
 struct frame_default {
     uint32_t track_id;
     uint32_t bytes;
@@ -46,20 +46,20 @@ struct parser {
     io_file *file;
     stream_info *info;
     mp4_codec *codec;
-    uint32_t track_id;                   // the audio track's
+    uint32_t track_id;                   // of the audio track
     frame_default defaults[kMaxTracks];  // the first default_count are used
     int32_t default_count;
-    bool ended;  // a frame was past the end of the file, so the list ends
+    bool ended;  // a frame was past the end of the file; no more are added
 };
 
-// Reads an unsigned big-endian number. 0 if p is null.
+// Parses an unsigned big-endian number. Returns 0 if `p` is null.
 uint64_t big_endian(const uint8_t *p, int32_t bytes) {
     uint64_t v = 0;
     for (int32_t i = 0; p != nullptr && i < bytes; ++i) v = v << 8 | p[i];
     return v;
 }
 
-// Reads a number from the file. 0 if the file does not contain all its bytes.
+// Reads a number from the file. Returns 0 if the file does not contain all of its bytes.
 uint64_t number(io_file *file, int64_t offset, int32_t bytes) {
     return big_endian(io_file_bytes(file, offset, bytes), bytes);
 }
@@ -68,8 +68,8 @@ uint32_t be32(io_file *file, int64_t offset) {
     return static_cast<uint32_t>(number(file, offset, 4));
 }
 
-// Removes the next box from the start of a level. A box whose stated size exceeds the level is
-// shortened to it. False if no box is left.
+// Reads the first box of a level and removes it from the level. A box that states too large a size
+// ends with the level. Returns false if no box is left.
 bool next_box(io_file *file, span *level, box *b) {
     const int64_t left = level->to - level->from;
     if (left < 8 || level->boxes++ == kMaxBoxes) return false;
@@ -88,7 +88,7 @@ bool next_box(io_file *file, span *level, box *b) {
     return true;
 }
 
-// Removes the boxes up to and including the next one with this name.
+// Reads and removes boxes up to the next one with this name. Returns false if no box has it.
 bool next_named(io_file *file, span *level, uint32_t name, box *b) {
     while (next_box(file, level, b)) {
         if (b->name == name) return true;
@@ -96,7 +96,7 @@ bool next_named(io_file *file, span *level, uint32_t name, box *b) {
     return false;
 }
 
-// Finds the first box with this name in a level.
+// Returns the contents of the first box with this name in a level.
 span find(io_file *file, span level, uint32_t name) {
     box b = {};
     return next_named(file, &level, name, &b) ? b.body : span{0, 0};
@@ -107,7 +107,7 @@ span find(io_file *file, span level, uint32_t name, Names... deeper) {
     return find(file, find(file, level, name), deeper...);
 }
 
-// Reads a descriptor's tag and removes everything except its contents from the span.
+// Reads a descriptor's tag and size. Reduces the span to the descriptor's contents.
 uint8_t descriptor(io_file *file, span *level) {
     const auto tag = static_cast<uint8_t>(number(file, level->from++, 1));
     int64_t size = 0;
@@ -119,7 +119,7 @@ uint8_t descriptor(io_file *file, span *level) {
     return level->from <= level->to ? tag : uint8_t{0};
 }
 
-// Reads the elementary stream descriptor: the object type and, for AAC, the configuration.
+// Reads the object type and, for AAC, the configuration from an elementary stream descriptor.
 void read_esds(const parser &p, span esds) {
     constexpr int64_t kObjectHead = 13;  // bytes: object type, stream type, buffer, bit rates
     esds.from += kFullHead;
@@ -139,9 +139,9 @@ void read_esds(const parser &p, span esds) {
         aac_config_read(&p.codec->config, io_file_bytes(p.file, esds.from, bytes), bytes);
 }
 
-// Reads the first sample description of the track.
+// Determines the codec from the track's first sample description.
 void read_codec(const parser &p, span stsd) {
-    // Bytes of the entry before its boxes, in ISO files and in QuickTime's versions 1 and 2.
+    // Number of bytes before the entry's boxes, in ISO files and in versions 1 and 2 of QuickTime.
     constexpr int64_t kEntryHeads[] = {28, 28 + 16, 28 + 36};
     box entry = {};
     stsd.from += kFullHead + 4;
@@ -156,7 +156,7 @@ void read_codec(const parser &p, span stsd) {
     if (entry.name == name_of("mp4a") && esds.to > 0) read_esds(p, esds);
 }
 
-// Adds a frame unless it has no bytes. False if memory runs out or the file is too small for so
+// Adds a frame unless it is empty. Returns false if memory runs out or the file is too small for so
 // many frames.
 bool add_frame(parser *p, int64_t offset, int64_t bytes) {
     if (bytes == 0) return true;
@@ -166,8 +166,8 @@ bool add_frame(parser *p, int64_t offset, int64_t bytes) {
                         frame_index_add(frames, offset, static_cast<int32_t>(bytes), 0));
 }
 
-// Contents of a table box after version and flags. The tables are read in parallel and may be far
-// apart, so they are loaded.
+// Contents of a table box after version and flags. Tables are read side by side but may be far
+// apart in the file, so they are loaded into memory.
 struct table {
     uint8_t *data;  // owned; null if missing or too long, or if memory ran out
     int64_t bytes;
@@ -183,7 +183,7 @@ table load(io_file *file, span body) {
     return t;
 }
 
-// The number at an offset, or 0 if it is past the end.
+// Returns the number at an offset of the table; 0 past the end.
 int64_t value(const table &t, int64_t at, int32_t width) {
     const bool inside = at >= 0 && at + width <= t.bytes;
     return static_cast<int64_t>(big_endian(inside ? t.data + at : nullptr, width));
@@ -192,9 +192,9 @@ int64_t value(const table &t, int64_t at, int32_t width) {
 // The tables of a track: frames per chunk, offsets of the chunks, sizes of the frames.
 struct tables {
     table runs;    // "stsc": count; first chunk, frames in each, description (32 bits each)
-    table chunks;  // "stco", "co64": count; offsets of chunk_width
+    table chunks;  // "stco", "co64": count; offsets of chunk_width bytes
     table sizes;   // "stsz": size of all frames or 0, count, sizes; "stz2": bits, count, sizes
-    int32_t chunk_width;  // frames, or 0 if there are no groups
+    int32_t chunk_width;  // bytes per chunk offset
     int32_t size_bits;
     int64_t count;  // frames
 };
@@ -267,7 +267,7 @@ uint32_t default_size(const parser *p, uint32_t track_id) {
     return 0;
 }
 
-// Reads one run of a track's frames in a fragment. Moves *offset to the end of the frames.
+// Reads one run of a track's frames, which start at *offset. Moves *offset to their end.
 bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64_t *offset) {
     const uint32_t flags = be32(p->file, run.from);
     const int64_t count = be32(p->file, run.from + kFullHead);
@@ -282,7 +282,7 @@ bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64
     const int64_t entry =
         before + (sized ? 4 : 0) + ((flags & 0x400) != 0 ? 4 : 0) + ((flags & 0x800) != 0 ? 4 : 0);
     const int64_t end = p->file->size;
-    if (!sized && (size == 0 || !ours)) {  // only the file's size limits the count
+    if (!sized && (size == 0 || !ours)) {  // nothing except the file's size limits the count
         *offset = std::min(*offset, end) + (size > 0 ? std::min(count, end / size + 1) * size : 0);
         return true;
     }
@@ -294,8 +294,8 @@ bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64
     return true;
 }
 
-// Reads all runs of one track of a fragment. *offset is where its frames start, unless the fragment
-// states otherwise; moves it to their end.
+// Reads all runs of one track of a fragment. The frames start at *offset, unless the fragment
+// states another offset. Moves *offset to their end.
 bool read_track_runs(parser *p, int64_t moof, span traf, int64_t *offset) {
     io_file *file = p->file;
     const span head = find(file, traf, name_of("tfhd"));

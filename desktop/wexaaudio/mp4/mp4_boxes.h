@@ -2,8 +2,7 @@
 // track, its codec and the offset of every frame. The offsets come from the tables of the movie box
 // and of its fragments. Edit lists are ignored.
 //
-// In: the file. Out: the frames, without their lengths in samples, and the codec. After:
-// mp4_demux.cpp.
+// Input: the file. Output: the codec and the frames, without sample counts. Precedes mp4_demux.cpp.
 #ifndef WEXAAUDIO_MP4_BOXES_H
 #define WEXAAUDIO_MP4_BOXES_H
 
@@ -12,12 +11,12 @@
 
 struct mp4_codec {
     bool is_mpeg;       // Layer III
-    bool is_aac;        // and the configuration is known
-    aac_config config;  // only for AAC
+    bool is_aac;        // AAC with a known configuration
+    aac_config config;  // valid if is_aac
 };
 
-// Skips frames past the end of the file and all frames after them. False if the file has no movie
-// box or cannot be read, or if memory runs out.
+// Stops adding frames at the first one past the end of the file. Returns false if the file has no
+// movie box or cannot be read, or if memory runs out.
 bool mp4_read_boxes(io_file *file, stream_info *info, mp4_codec *codec);
 
 #endif

@@ -1,7 +1,7 @@
-// MP4: the first audio track, AAC or MPEG Layer III. A demuxer has only this stream, and the stream
-// handle is the demuxer itself.
+// Reads the first audio track of an MP4 file, AAC or MPEG Layer III. A demuxer has no other stream,
+// so the stream handle is the demuxer itself.
 //
-// In: mtsrc_io. Out: PCM, the information records.
+// Input: mtsrc_io. Output: PCM and the information records. Follows mp4/mp4_boxes.h.
 #include <algorithm>
 #include <cstring>
 
@@ -12,12 +12,11 @@
 
 namespace {
 
-// Number of frames searched for a header that states rate and length. Normally the first frame has
-// one.
+// Number of frames searched for a valid header. Normally the first frame has one.
 constexpr int64_t kTriedFrames = 64;
 
-// Reads rate, channels and frame length of a Layer III track from its frames, which all have the
-// same length.
+// Reads the rate, channels and frame length of a Layer III track from its first valid header. All
+// frames have the same length.
 bool read_mpeg_format(io_file *file, stream_info *info) {
     mpeg_header h = {};
     bool known = false;

@@ -11,10 +11,10 @@ constexpr int32_t kVersion25 = 0;
 constexpr int32_t kModeMono = 3;
 constexpr int32_t kVbriAt = 36;  // bytes from the start of the frame, whatever its side information
 
-constexpr int32_t kRates[3] = {44100, 48000,
-                               32000};  // Hz for MPEG-1; a half for 2, a quarter for 2.5
+// Sample rates of MPEG-1 in Hz. Those of MPEG-2 are half as high, those of 2.5 a quarter.
+constexpr int32_t kRates[3] = {44100, 48000, 32000};
 
-// kbit/s by [MPEG-1 first][layer - 1][bitrate index].
+// Bitrates in kbit/s, indexed by [0 for MPEG-1, 1 for others][layer - 1][bitrate index].
 constexpr int32_t kBitrates[2][3][15] = {
     {{0, 32, 64, 96, 128, 160, 192, 224, 256, 288, 320, 352, 384, 416, 448},
      {0, 32, 48, 56, 64, 80, 96, 112, 128, 160, 192, 224, 256, 320, 384},
@@ -30,7 +30,7 @@ int32_t frame_bytes(const mpeg_header &h, int32_t kbits, int32_t padding) {
     return factor * bits / h.rate + padding;
 }
 
-// Bytes from the start of a Layer III frame to its main data.
+// Returns the number of bytes from the start of a Layer III frame to its main data.
 int32_t main_data_at(const mpeg_header *h) {
     const int32_t side =
         h->version == 1 ? (h->channels == 1 ? 17 : 32) : (h->channels == 1 ? 9 : 17);
@@ -66,7 +66,7 @@ bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b) {
 
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes) {
     if (h->layer != 3) return false;
-    // Some encoders ignore the check sum when they place the table.
+    // Some encoders place the table as if there were no checksum.
     const int32_t at = main_data_at(h);
     for (const int32_t place : {at, h->has_crc ? at - 2 : at}) {
         if (place + 4 <= bytes &&
@@ -82,8 +82,8 @@ void mpeg_describe(const mpeg_header *head, stream_info *info) {
     info->rate = head->rate;
     info->channels = head->channels;
     info->out_channels = head->channels;
-    // The filter bank remembers at most two frames (Layer I; Layer III of MPEG-2). A third is a
-    // cheap margin.
+    // The filter bank's memory spans at most two frames (in Layer I and in Layer III of MPEG-2).
+    // The third is a cheap margin.
     info->preroll = 3;
     info->reservoir = head->layer == 3 ? kMpegMaxBackstep : 0;
     info->overhead = main_data_at(head);

@@ -1,5 +1,5 @@
-// The four bytes at the start of every MPEG audio frame (ISO/IEC 11172-3, 13818-3 and its 2.5
-// extension), and the parts of a frame's body that the reader needs.
+// Parses the four-byte headers of MPEG audio frames (ISO/IEC 11172-3, 13818-3 and its 2.5
+// extension) and the parts of a frame's body that the readers need.
 #ifndef WEXAAUDIO_MPEG_HEADER_H
 #define WEXAAUDIO_MPEG_HEADER_H
 
@@ -9,7 +9,7 @@
 
 constexpr int32_t kMpegHeaderBytes = 4;
 constexpr int32_t kMpegMaxFrame = 1732;    // bytes: Layer II, 384 kbit/s at 32 kHz, padded
-constexpr int32_t kMpegMaxBackstep = 511;  // bytes of main data before a Layer III frame
+constexpr int32_t kMpegMaxBackstep = 511;  // bytes of main data that may precede a Layer III frame
 
 struct mpeg_header {
     int32_t version;   // 1, 2, or 25 for 2.5
@@ -21,17 +21,17 @@ struct mpeg_header {
     bool has_crc;      // two bytes follow the header
 };
 
-// Parses four bytes. False if they are not a header, or one of free format, which states no length.
+// Parses four bytes. Returns false if they are not a header or are one of free format.
 bool mpeg_parse(const uint8_t *p, mpeg_header *h);
 
-// True if both frames may belong to one stream: same version, layer and rate.
+// True if both frames may belong to the same stream: version, layer and rate are equal.
 bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
 
 // True if a stream's first frame contains an encoder's table (Xing, Info, VBRI) instead of music.
-// p: the first bytes of the frame, as many as `bytes`.
+// p[bytes] is the start of the frame.
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
 
-// Sets how a stream of such frames is decoded, bare or in a container.
+// Sets the fields of `info` that determine how frames like `head` are decoded.
 void mpeg_describe(const mpeg_header *head, stream_info *info);
 
 #endif

@@ -1,6 +1,6 @@
-// Bare MPEG audio files, Layers I to III: one scan over the frame headers, past tags and garbage.
+// Reads bare MPEG audio files, Layers I to III. One scan of the headers skips tags and garbage.
 //
-// In: mtsrc_io. Out: PCM, the information record.
+// Input: mtsrc_io. Output: PCM and the information record. Precedes copy_decoder.cpp.
 #include <algorithm>
 #include <cstring>
 
@@ -14,21 +14,21 @@ namespace {
 constexpr int32_t kDropRate = 44100;  // Hz
 
 constexpr int32_t kId3v1Bytes = 128;
-constexpr int32_t kApeFooter = 32;            // bytes, also of the header
+constexpr int32_t kApeFooter = 32;            // bytes; an APE header is as long
 constexpr int32_t kLook = 4 * kMpegMaxFrame;  // bytes read to confirm a header
-constexpr int32_t kFirstChain = 3;            // headers in a row that mark the start of the stream
-constexpr int32_t kResyncChain = 2;           // headers in a row that continue it after garbage
+constexpr int32_t kFirstChain = 3;   // consecutive headers that mark the start of the stream
+constexpr int32_t kResyncChain = 2;  // consecutive headers that continue it after garbage
 
 struct mpeg_scan {
     io_file *file;
-    int64_t end;       // end of the audio: start of the tags at the end of the file
-    int64_t at;        // offset
+    int64_t end;       // end of the audio, before the tags at the end of the file
+    int64_t at;        // current offset in the file
     mpeg_header head;  // header of the first frame, once started
     bool started;
 };
 
-// Returns the size of the tag that ends at `end`, or 0. Tags are read backwards; a tag that is not
-// in the buffer is read together with the bytes before it.
+// Returns the size of the tag that ends at `end`, or 0. Tags are searched for backwards, so the
+// buffer is filled with the bytes before `end`.
 int64_t tag_before(io_file *file, int64_t end) {
     const bool buffered = end - kId3v1Bytes >= file->block_at;
     int32_t got = 0;
@@ -51,8 +51,8 @@ int64_t find_end(io_file *file) {
     return end;
 }
 
-// True if p starts a chain of headers of one stream. The chain may be shorter if it ends exactly at
-// the end of the audio. `p` has `got` bytes; `to_end` bytes of audio are left.
+// True if `p` starts a chain of consecutive headers of one stream. A chain that ends exactly at the
+// end of the audio may be shorter. `p` has `got` bytes; the audio ends `to_end` bytes after `p`.
 bool starts_chain(const mpeg_scan *s, const uint8_t *p, int32_t got, int64_t to_end,
                   mpeg_header *first) {
     const mpeg_header *reference = s->started ? &s->head : nullptr;
@@ -73,13 +73,13 @@ bool starts_chain(const mpeg_scan *s, const uint8_t *p, int32_t got, int64_t to_
 }
 
 // Moves s->at to the next offset where the stream starts or continues, skipping complete ID3v2
-// tags. False at the end.
+// tags. Returns false at the end of the audio.
 bool find_chain(mpeg_scan *s, mpeg_header *first) {
     while (s->at < s->end) {
         int32_t got = 0;
         const uint8_t *p = io_file_peek(s->file, s->at, kLook, &got);
         if (p == nullptr || got < kMpegHeaderBytes) return false;
-        // Only the last block of the file is searched to its end.
+        // Only the last block is searched to its end; in others a chain might be cut off there.
         const int32_t sure = s->at + got >= s->end ? got : got - kLook + 1;
         int64_t tag = 0;
         int32_t i = 0;
@@ -95,7 +95,7 @@ bool find_chain(mpeg_scan *s, mpeg_header *first) {
     return false;
 }
 
-// Finds the first frame of music, after the encoder's table.
+// Finds the first frame of music, after any encoder's table.
 bool find_start(mpeg_scan *s) {
     if (!find_chain(s, &s->head)) return false;
     s->started = true;
@@ -108,8 +108,8 @@ bool find_start(mpeg_scan *s) {
     return find_chain(s, &s->head);
 }
 
-// Adds the frames from s->at to the end, except an incomplete last one. False on a read error, if
-// memory runs out or if no frame was found.
+// Adds all complete frames from s->at on. Returns false if there are none, if reading fails or if
+// memory runs out.
 bool walk(mpeg_scan *s, frame_index *frames) {
     mpeg_header h = {};
     while (s->end - s->at >= kMpegHeaderBytes) {

@@ -1,10 +1,10 @@
-// Ogg: the first audio stream of the file's first group of streams, which must be Vorbis. A demuxer
-// has only this stream, and the stream handle is the demuxer itself.
+// Reads the first audio stream in an Ogg file's first group of streams; it must be Vorbis. A
+// demuxer has no other stream, so the stream handle is the demuxer itself.
 //
-// In: mtsrc_io. Out: PCM, the set-up data, the information records.
+// Input: mtsrc_io. Output: PCM, the set-up data and the information records.
 //
-// A stream's pages are scattered in the file, and packets continue across pages. Therefore a packet
-// is identified by its logical offset: the number of bytes in the stream's page bodies before it.
+// A stream's pages are scattered over the file, and a packet may span several pages. A packet is
+// therefore identified by its logical offset: the number of bytes before it in the page bodies.
 #include <ogg/ogg.h>
 
 #include <algorithm>
@@ -21,53 +21,54 @@ namespace {
 constexpr int32_t kReadBytes = 65536;
 constexpr int32_t kVorbis = 323;  // codec code
 
-// First bytes of the audio codecs' first packets. Vorbis must be the first entry.
+// The bytes with which each audio codec's first packet starts. Vorbis must be the first entry.
 constexpr std::string_view kAudio[] = {"\x01vorbis", "OpusHead", "\177FLAC", "fLaC", "Speex   "};
 
 constexpr int32_t kVorbisHeaders = 3;           // packets: identification, comments, set-up
 constexpr int32_t kNameBytes = 7;               // packet type and "vorbis"
 constexpr int32_t kIdBytes = 30;                // of the identification packet
-constexpr int32_t kChannelsAt = 11;             // in it
-constexpr int32_t kRateAt = 12;                 // likewise; 32-bit, little endian
-constexpr int32_t kMaxCodebooks = 1 << 20;      // bytes; usual ones have 3 to 10 thousand
-constexpr int64_t kMaxGranule = INT64_MAX / 2;  // larger ones count as this: sums stay exact
-constexpr int32_t kMaxPacket32 = 1 << 26;       // bytes; comments may hold pictures
+constexpr int32_t kChannelsAt = 11;             // offset in the identification packet
+constexpr int32_t kRateAt = 12;                 // the same; 32 bits, little-endian
+constexpr int32_t kMaxCodebooks = 1 << 20;      // bytes; real ones have 3 to 10 thousand
+constexpr int64_t kMaxGranule = INT64_MAX / 2;  // larger ones are clamped, so sums cannot overflow
+constexpr int32_t kMaxPacket32 = 1 << 26;       // bytes; comments may contain pictures
 
-// An empty comment packet. It replaces the file's comments, which no decoder needs and which may
-// contain a picture.
+// An empty comment packet. It replaces the file's own, which may contain a picture and which no
+// decoder needs.
 constexpr uint8_t kNoComments[] = {3, 'v', 'o', 'r', 'b', 'i', 's', 0, 0, 0, 0, 0, 0, 0, 0, 1};
-constexpr int32_t kPackHead = 3;  // the mark and the lengths of the first two packets, below 255
+constexpr int32_t kPackHead = 3;  // bytes: the mark and two packet lengths, each below 255
 
 struct ogg_scan {
     io_file *file;
     const codec_library *library;
     stream_info *info;
     ogg_sync_state sync;    // finds pages
-    int64_t read_at;        // offset in the file of the next byte to be read
-    int64_t parse_at;       // and of the next one to be parsed
+    int64_t read_at;        // file offset of the next byte to read
+    int64_t parse_at;       // file offset of the next byte to parse
     vorbis_parser *parser;  // owned; null until the headers are complete
     int64_t header_at[kVorbisHeaders];
     int32_t header_bytes[kVorbisHeaders];
     int32_t headers;       // header packets found so far
-    long next_page;        // number of the page after the last one
+    long next_page;        // expected number of the next page
     bool gap;              // pages are missing since the last granule position
     bool open;             // a packet has begun and not ended
-    int64_t packet_at;     // its logical offset
-    int32_t packet_bytes;  // its bytes so far
-    uint8_t packet_first;  // its first byte
+    int64_t packet_at;     // logical offset of the open packet
+    int32_t packet_bytes;  // size of the open packet so far
+    uint8_t packet_first;  // first byte of the open packet
     bool has_base;
     int64_t base;      // granule position of sample 0; valid if has_base
     int64_t page_end;  // end of the audio at the second-to-last page with a granule position
     int64_t last_end;  // end of the audio at the last granule position, sample frames
 };
 
-// Copies the first bytes of a header packet, at least its name. False if it is not a Vorbis header.
+// Copies the start of a header packet, at least kNameBytes. Returns false if it is not Vorbis.
 bool read_header(const ogg_scan *scan, int32_t number, uint8_t *packet, int32_t bytes) {
     return stream_copy(scan->file, scan->info, scan->header_at[number], packet, bytes) == bytes &&
            packet[0] == 2 * number + 1 && memcmp(packet + 1, "vorbis", kNameBytes - 1) == 0;
 }
 
-// Packs the identification and set-up packets into `p`. False if they are not Vorbis headers.
+// Packs the headers, with empty comments, into `p` and reads the rate and the channels from them.
+// Returns false if they are not Vorbis headers.
 bool pack(const ogg_scan *scan, uint8_t *p) {
     p[0] = kVorbisSetupMark;
     p[1] = kIdBytes;
@@ -86,7 +87,7 @@ bool pack(const ogg_scan *scan, uint8_t *p) {
     return scan->info->rate > 0 && scan->info->channels > 0;
 }
 
-// Prepares the stream when its three header packets are complete.
+// Creates the set-up data and the parser once the three header packets are complete.
 bool read_headers(ogg_scan *scan) {
     const int32_t books = scan->header_bytes[2];
     uint8_t name[kNameBytes];
@@ -102,7 +103,7 @@ bool read_headers(ogg_scan *scan) {
     return scan->parser != nullptr;
 }
 
-// Adds a complete packet.
+// Adds a complete packet, a header or audio.
 bool add_packet(ogg_scan *scan) {
     if (scan->headers < kVorbisHeaders) {
         if (scan->packet_bytes < kNameBytes) return false;
@@ -113,15 +114,15 @@ bool add_packet(ogg_scan *scan) {
     }
     if (scan->packet_bytes == 0) return true;
     const int32_t samples = scan->library->parser_samples(scan->parser, scan->packet_first);
-    if (samples <= 0) return true;  // not an audio packet: not decoded
+    if (samples <= 0) return true;  // not an audio packet, so it is skipped
     // The first packet has no output; it only prepares the decoder for the next.
     frame_index *packets = &scan->info->frames;
     return frame_index_add(packets, scan->packet_at, scan->packet_bytes,
                            packets->count > 0 ? samples : 0);
 }
 
-// The first granule position determines where the stream starts. Audio beyond its count is cut off
-// at the start, or at the end if the stream ends on this page.
+// Applies the first granule position, which determines where the stream starts. Audio in excess of
+// it is cut off at the start, or at the end if the stream ends on this page.
 void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     frame_index *packets = &scan->info->frames;
     const int64_t surplus = frame_index_end(packets) - granule;
@@ -142,7 +143,7 @@ void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     }
 }
 
-// Reads the page's packets, using its lacing values.
+// Splits a page, whose body starts at the logical offset body_first, into packets.
 bool read_segments(ogg_scan *scan, const ogg_page *page, int64_t body_first) {
     const int32_t segments = page->header[26];
     const uint8_t *lacing = page->header + 27;
@@ -167,16 +168,16 @@ bool read_segments(ogg_scan *scan, const ogg_page *page, int64_t body_first) {
     return true;
 }
 
-// Adds the next page of the stream. body_at: offset of its body in the file. False if memory runs
-// out or the stream is not Vorbis.
+// Adds the next page of the stream. Its body is at body_at in the file. Returns false if memory
+// runs out or the stream is not Vorbis.
 bool add_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
     frame_index *pages = &scan->info->pages;
     const frame_index *packets = &scan->info->frames;
     const int64_t body_first = frame_index_end(pages);
     const auto body_bytes = static_cast<int32_t>(page->body_len);
     if (body_bytes > 0 && !frame_index_add(pages, body_at, body_bytes, body_bytes)) return false;
-    // A packet continues only on the next page, and only if that page says so. Otherwise it is
-    // lost.
+    // An open packet is lost unless the next page follows immediately and is marked as its
+    // continuation.
     const long number = ogg_page_pageno(page);
     const bool missing = number != scan->next_page;
     if (missing || ogg_page_continued(page) == 0) scan->open = false;
@@ -189,18 +190,18 @@ bool add_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
     if (!scan->has_base) {
         apply_first_granule(scan, granule, ogg_page_eos(page) != 0);
     } else if (scan->gap) {
-        scan->base = granule - frame_index_end(packets);  // lost time is not filled with silence
+        scan->base = granule - frame_index_end(packets);  // lost audio is not replaced by silence
     }
     scan->gap = false;
     scan->last_end = granule - scan->base;
     return true;
 }
 
-// Cuts the last packets at the final granule position. False if the stream has no audio.
+// Cuts off the audio after the final granule position. Returns false if no audio is left.
 bool cut_end(ogg_scan *scan) {
     frame_index *packets = &scan->info->frames;
     if (!scan->has_base) return packets->count > 0;
-    // The end is never before that of the second-to-last page; a smaller position is damage.
+    // A final position before the end of the second-to-last page is damage and is ignored.
     const int64_t end = std::max(scan->last_end, scan->page_end);
     for (int64_t i = packets->count - 1; i >= 0 && frame_index_end(packets) > end; --i) {
         frame_entry &entry = packets->entry[i];
@@ -211,8 +212,8 @@ bool cut_end(ogg_scan *scan) {
     return packets->count > 0;
 }
 
-// Reads the next complete page with a correct check sum. *offset receives its start. False at the
-// end and on failure.
+// Reads the next complete page with a correct checksum and stores its file offset. Returns false at
+// the end of the file and on failure.
 bool next_page(ogg_scan *scan, ogg_page *page, int64_t *offset) {
     io_file *file = scan->file;
     for (;;) {
@@ -231,7 +232,7 @@ bool next_page(ogg_scan *scan, ogg_page *page, int64_t *offset) {
     }
 }
 
-// Adds the stream whose first page this is. The first audio stream is the one to read.
+// Adds a stream, given its first page. The first audio stream is selected for reading.
 void add_stream(stream_info *info, const ogg_page *page) {
     if (info->track_count >= kOggStreams) return;
     const int32_t i = info->track_count++;
@@ -246,8 +247,8 @@ void add_stream(stream_info *info, const ogg_page *page) {
     }
 }
 
-// Reads the pages of the first group of streams; another group may follow it. False if the audio
-// stream turns out not to be Vorbis.
+// Reads the pages of the first group of streams and ignores any other group. Returns false if the
+// audio stream turns out not to be Vorbis.
 bool read_pages(ogg_scan *scan) {
     stream_info *info = scan->info;
     ogg_page page;
@@ -278,7 +279,7 @@ bool scan_file(io_file *file, stream_info *info) {
     scan.info = info;
     info->track = -1;
     info->out_channels = 1;
-    info->preroll = 1;  // a packet overlaps the one before
+    info->preroll = 1;  // each packet overlaps the one before it
     const bool is_vorbis = read_pages(&scan) && info->codec != nullptr && cut_end(&scan);
     if (!is_vorbis) info->codec = nullptr;
     scan.library->parser_close(scan.parser);

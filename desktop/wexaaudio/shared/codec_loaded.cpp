@@ -1,4 +1,4 @@
-// Loads the table from libwexaaudio_av.so, in the folder of the library that contains this code. It
+// Loads the table from libwexaaudio_av.so in the folder of the library that contains this code. It
 // stays loaded until the process ends.
 #include <android/log.h>
 #include <dlfcn.h>
@@ -17,7 +17,7 @@ std::mutex lock;
 const codec_library *loaded;  // guarded by lock
 
 const codec_library *load() {
-    // Loads it by its full path, because the sanitizers' dlopen ignores this library's own search
+    // The path must be complete, because the sanitizers' dlopen ignores this library's own search
     // path.
     Dl_info self = {};
     char path[4096];

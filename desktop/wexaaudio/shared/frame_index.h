@@ -1,5 +1,5 @@
-// Every compressed frame of a stream with its offsets in the file and in the stream. Built once at
-// open. Durations and seeks are looked up here, never estimated.
+// Index of a stream's compressed frames: where each is in the file and in the decoded stream. It is
+// built when a file is opened. Durations and seek positions come from it and are never estimated.
 #ifndef WEXAAUDIO_FRAME_INDEX_H
 #define WEXAAUDIO_FRAME_INDEX_H
 
@@ -18,15 +18,15 @@ struct frame_index {
     int64_t capacity;
 };
 
-// Appends a frame that begins where the last one ends. False, with the index unchanged, if memory
-// runs out or there are more frames or samples than any real file has.
+// Appends a frame that starts where the last one ends. Returns false and leaves the index unchanged
+// if memory runs out or there are more frames or samples than any real file has.
 bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples);
 
-// Index of the frame that contains `sample`: the last one whose `first` is not after it. 0 before
-// the first frame, count - 1 past the end. The index must not be empty.
+// Returns the number of the frame that contains `sample`, which is the last one that starts at or
+// before it; 0 before the first frame, count - 1 past the end. The index must not be empty.
 int64_t frame_index_find(const frame_index *index, int64_t sample);
 
-// End of the last frame, sample frames; 0 if empty.
+// Returns the end of the last frame in sample frames; 0 if the index is empty.
 int64_t frame_index_end(const frame_index *index);
 
 #endif

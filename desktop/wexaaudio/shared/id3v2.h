@@ -1,14 +1,14 @@
-// ID3v2 tags, which may come before any bare stream and, in MPEG audio, inside it.
+// Detects ID3v2 tags, which may come before any bare stream and, in MPEG audio, inside it.
 #ifndef WEXAAUDIO_ID3V2_H
 #define WEXAAUDIO_ID3V2_H
 
 #include <cstdint>
 #include <cstring>
 
-constexpr int32_t kId3v2Head = 10;  // bytes; a footer has as many
+constexpr int32_t kId3v2Head = 10;  // bytes; a footer is as long
 
-// Bytes of the tag that starts with these kId3v2Head bytes, including a footer, or 0 if they do not
-// start a tag. p may be null.
+// Returns the length in bytes of the tag that starts at `p`, including any footer, or 0 if no tag
+// starts there. `p` has kId3v2Head bytes or is null.
 inline int64_t id3v2_bytes(const uint8_t *p) {
     if (p == nullptr || memcmp(p, "ID3", 3) != 0 || p[3] < 2 || p[3] > 4 || p[4] == 0xFF) return 0;
     const int64_t size =

@@ -6,8 +6,7 @@
 
 namespace {
 
-// Reads up to count bytes at offset into buf through the callbacks. Returns the bytes read; -1 on
-// failure.
+// Reads up to `count` bytes at `offset` through the callbacks. Returns the number read, or -1.
 int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
     if (f->at != offset) {
         f->at = f->io.seek(f->file, &offset) == 0 ? offset : -1;
@@ -28,7 +27,7 @@ int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
     return done;
 }
 
-// Makes the block start at offset. Keeps the bytes that it already has.
+// Refills the block so that it starts at `offset`. Keeps the bytes that it already has.
 bool fill_block(io_file *f, int64_t offset) {
     const int64_t block_end = f->block_at + f->block_got;
     int32_t keep = 0;

@@ -1,7 +1,7 @@
-// File access of every reader: its own handle, opened through the source's callbacks and read at
-// any offset through one buffer. Offsets and sizes are 64-bit.
+// File access of the readers. Each reader opens its own handle through the source's callbacks and
+// reads at any offset through one buffer. Offsets and sizes are 64-bit.
 //
-// In: mtsrc_io. Out: bytes at an offset. Used by one thread at a time.
+// Input: mtsrc_io. Output: bytes at an offset. A file is used by one thread at a time.
 #ifndef WEXAAUDIO_IO_FILE_H
 #define WEXAAUDIO_IO_FILE_H
 
@@ -11,7 +11,7 @@ constexpr int32_t kIoBlock = 65536;         // bytes read ahead
 constexpr int32_t kMaxLook = kIoBlock / 2;  // bytes that io_file_peek can guarantee
 
 struct io_file {
-    mtsrc_io io;        // a copy, so that the callbacks can be called while the reader is deleted
+    mtsrc_io io;        // a copy, so that deleting a reader does not need the caller's record
     mtsrc_file *file;   // owned
     int64_t size;       // bytes, when the file was opened
     int64_t at;         // offset of the handle, or -1 if unknown
@@ -21,22 +21,22 @@ struct io_file {
     bool failed;        // a read or seek has failed
 };
 
-// Opens io's file read-only. False on failure, with nothing to release. *f may be uninitialised.
+// Opens the file read-only. On failure returns false and owns nothing. *f may be uninitialised.
 bool io_file_open(io_file *f, const mtsrc_io *io);
 
 // Releases what *f owns. Does nothing for a zeroed or closed record.
 void io_file_close(io_file *f);
 
-// Copies up to `count` bytes at `offset`. Returns the bytes copied, fewer only at the end of the
-// file; 0 past the end; -1 on a read error. Large copies bypass the buffer.
+// Copies up to `count` bytes at `offset`. Returns the number of bytes copied, which is smaller only
+// at the end of the file, or -1 on a read error. Large copies bypass the buffer.
 int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count);
 
-// Returns the buffered bytes at `offset`, valid until the next call. *got receives their count: at
-// least min(want, bytes to the end of the file), often more. want <= kMaxLook. Returns null outside
-// the file and on a read error, which sets failed.
+// Returns the buffered bytes at `offset`, valid until the next call, and stores their count in
+// *got. Unless the file ends first, there are at least `want`, which must not exceed kMaxLook.
+// Returns null outside the file and on a read error, which also sets `failed`.
 const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *got);
 
-// Returns exactly `count` bytes at `offset`, as io_file_peek does. Null if the file has fewer.
+// Returns `count` bytes at `offset` as io_file_peek does, or null if the file has fewer.
 const uint8_t *io_file_bytes(io_file *f, int64_t offset, int32_t count);
 
 #endif

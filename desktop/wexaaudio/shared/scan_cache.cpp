@@ -9,22 +9,22 @@
 
 namespace {
 
-// A second change within a tick of the file system's clock does not update the time of change.
+// Two changes in quick succession may get the same time of change. After this long they cannot.
 constexpr time_t kSettled = 2;  // seconds
 
 struct cached_scan : stream_info {
     scan_function scan;
     mtsrc_file *(*open)(const mtsrc_io *io, int32_t mode);
     struct stat file;
-    bool shared;  // file is valid
+    bool shared;  // `file` is valid, so other readers may use the scan
     int32_t users;
     cached_scan *next;
 };
 
 std::mutex lock;
-cached_scan *scans;  // guarded by lock, like users and next of each scan
+cached_scan *scans;  // guarded by lock, as are `users` and `next` of each scan
 
-// False if the path does not identify the file that the callbacks read.
+// Returns false if the path does not identify the file that the callbacks read.
 bool identify(const io_file *file, struct stat *known) {
     const char *path = file->io.path;
     return path != nullptr && strcmp(path, "fd") != 0 && stat(path, known) == 0 &&
@@ -38,7 +38,7 @@ bool is_same(const cached_scan &a, const cached_scan &b) {
            a.file.st_ctim.tv_nsec == b.file.st_ctim.tv_nsec;
 }
 
-// Finds the same scan of the same file and adds a user to it. Null if there is no such scan.
+// Finds the same scan of the same file and adds a user to it. Returns null if none exists.
 cached_scan *find(const cached_scan &wanted) {
     const std::lock_guard<std::mutex> guard(lock);
     cached_scan *c = scans;

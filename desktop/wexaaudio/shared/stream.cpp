@@ -11,7 +11,7 @@ namespace {
 
 constexpr int32_t kFailed = -3;  // a read error
 
-// Index of the first frame to decode so that frame n is bit-identical to a linear read.
+// Returns the first frame to decode so that frame n is bit-identical to that of a linear read.
 int64_t first_needed(const stream_info *info, int64_t n) {
     if (info->group > 0) n -= n % info->group;
     n = std::max<int64_t>(n - info->preroll, 0);
@@ -22,7 +22,7 @@ int64_t first_needed(const stream_info *info, int64_t n) {
     return n;
 }
 
-// Returns the sample frames of the output; 0 if the frame cannot be decoded; kFailed or
+// Returns the number of sample frames in the output; 0 if the frame cannot be decoded; kFailed or
 // kCodecNoMemory, which end the read.
 int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     if (entry.bytes <= 0 || entry.bytes > kMaxPacket) return 0;
@@ -35,7 +35,7 @@ int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     return held == -1 ? 0 : held;
 }
 
-// Decodes frame `next` and, if the decoder is fresh, first the frames that it depends on.
+// Decodes frame r->next. A fresh decoder first decodes the frames that this one depends on.
 int32_t decode_next(stream_reader *r) {
     const stream_info *info = r->info;
     int64_t n = r->next;
@@ -50,7 +50,7 @@ int32_t decode_next(stream_reader *r) {
     return held;
 }
 
-// Sample frames that the source delivers.
+// Number of sample frames that the source delivers.
 int64_t delivered(const stream_info *info) {
     return std::max<int64_t>(frame_index_end(&info->frames) - info->delay, 0);
 }
@@ -110,8 +110,8 @@ int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached) {
     if (info->codec == nullptr) return -1;
     const int64_t end = delivered(info);
     const int64_t sample = seek_target(*position, end, info->rate);
-    // The source drops samples at time 0. At every other position, even in the first frame, the
-    // time is not 0, so that nothing is dropped twice.
+    // The source drops samples only at time 0. Every other position, even in the first frame, gets
+    // a time other than 0, so that nothing is dropped twice.
     const int64_t decoded = sample > 0 ? sample + info->delay : 0;
     const frame_index *frames = &info->frames;
     r->next = sample < end ? frame_index_find(frames, decoded) : frames->count;

@@ -1,8 +1,8 @@
 // Reads one stream of compressed frames as 16-bit PCM, starting at any sample. AAC, MPEG audio, MP4
-// and Ogg share this code: their readers are records of this type, and the same functions read,
+// and Ogg share this code: their readers are stream_reader records, and the same functions read,
 // seek and delete them.
 //
-// In: the frames that a format's scan finds. Out: PCM, frame by frame, for the copying decoders.
+// Input: the frames that a format's scan found. Output: PCM. Precedes copy_decoder.cpp.
 #ifndef WEXAAUDIO_STREAM_H
 #define WEXAAUDIO_STREAM_H
 
@@ -15,15 +15,15 @@ struct stream_reader {
     const stream_info *info;  // shared by the readers of the file
     av_decoder *decoder;      // owned; null until the first read after opening or a seek
     int64_t next;             // index of the frame to read next
-    int32_t skip;             // sample frames to drop from its start
+    int32_t skip;             // sample frames to drop from the start of that frame
 };
 
-// Opens a reader. Null if the file cannot be read as the format, if libavcodec is missing or if
-// memory runs out. *duration receives the duration of the stream in 100-ns units.
+// Opens a reader and stores the stream's duration in 100-ns units. Returns null if the file cannot
+// be read as the format, if libavcodec is missing or if memory runs out.
 stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration);
 
-// Copies bytes starting at an offset of the kind in frame_entry, which is logical for Ogg. Returns
-// the bytes copied, fewer if the pages or the file end first; -1 on a read error.
+// Copies bytes from an offset as stored in frame_entry, which is logical for Ogg. Returns the
+// number of bytes copied, fewer if the pages or the file end first; -1 on a read error.
 int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
                     int64_t bytes);
 

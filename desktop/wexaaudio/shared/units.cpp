@@ -9,7 +9,7 @@ int64_t units_from_samples(int64_t sample, int32_t rate) {
 int64_t seek_target(int64_t units, int64_t end, int32_t rate) {
     if (units <= 0) return 0;
     if (units >= units_from_samples(end, rate)) return end;
-    // Times of samples are rounded up to units, so the sample is the first one that begins after
+    // The time of a sample is rounded up, so the wanted sample is the first one that starts after
     // the previous unit.
     const int64_t before = units - 1;
     return before / kUnits * rate + before % kUnits * rate / kUnits + 1;

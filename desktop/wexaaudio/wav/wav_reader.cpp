@@ -1,6 +1,6 @@
-// RIFF WAVE with 16-bit linear PCM: chunks in any order, wrong sizes, files of more than 4 GiB.
+// Reads RIFF WAVE files with 16-bit PCM. Accepts any chunk order, wrong sizes and more than 4 GiB.
 //
-// In: mtsrc_io. Out: complete sample frames of interleaved PCM, the information record.
+// Input: mtsrc_io. Output: complete sample frames of interleaved PCM, and the information record.
 #include <algorithm>
 #include <climits>
 #include <cstdlib>
@@ -23,7 +23,7 @@ constexpr int32_t kTagExtensible = 0xFFFE;
 constexpr int32_t kTagCollision = 0x10000;  // distinguishes a file's own tag 300 from kWexaPcm
 constexpr int32_t kSampleBytes = 2;
 
-// The bytes after the format tag in the sub-format of an extensible header.
+// In an extensible header, the bytes that follow the format tag in the sub-format.
 constexpr uint8_t kSubFormatTail[14] = {0, 0, 0, 0, 0x10, 0, 0x80, 0, 0, 0xAA, 0, 0x38, 0x9B, 0x71};
 
 struct wav_reader {
@@ -35,7 +35,7 @@ struct wav_reader {
     int32_t rate;  // Hz; negative if the file states 2^31 or more
     int32_t bits;
     int64_t data;        // offset of the first sample frame
-    int64_t data_bytes;  // present in the file
+    int64_t data_bytes;  // bytes of audio in the file
     int32_t block;       // bytes of a sample frame
     int64_t total;       // sample frames
     int64_t next;        // sample frame to read next
@@ -61,8 +61,8 @@ void read_format(wav_reader *r, const uint8_t *p, int64_t bytes) {
     }
 }
 
-// A writer that did not finish leaves a data size of 0 or of all ones, and a file may be truncated.
-// In these cases the data is the rest of the file.
+// Locates the data. A writer that was interrupted leaves a size of 0 or of all ones, and a
+// truncated file states more than it has. In both cases the data is the rest of the file.
 void read_data(wav_reader *r, int64_t offset, uint32_t size) {
     const int64_t rest = r->file.size - offset;
     r->has_data = true;
@@ -71,8 +71,8 @@ void read_data(wav_reader *r, int64_t offset, uint32_t size) {
     if (size != 0 && size != kUnknownSize) r->data_bytes = std::min<int64_t>(rest, size);
 }
 
-// Walks the chunks until both the format and the data are known. False on a read error or if the
-// file is not RIFF WAVE.
+// Walks the chunks until both the format and the data are known. Returns false on a read error or
+// if the file is not RIFF WAVE.
 bool read_chunks(wav_reader *r) {
     io_file *f = &r->file;
     int32_t got = 0;
@@ -99,8 +99,8 @@ bool read_chunks(wav_reader *r) {
     return true;
 }
 
-// Fills the record, which also explains a refusal. If the header is too damaged, returns false and
-// leaves the record empty.
+// Fills in the record, which also shows the source why a file is refused. Returns false and leaves
+// the record empty if the header is too damaged.
 bool fill_info(xwav_info *info, const wav_reader *r) {
     if (!r->has_format || r->channels == 0 || r->rate <= 0) return false;
     info->codec = r->tag == kTagPcm    ? kWexaPcm
