@@ -1,4 +1,4 @@
-"""Adds to the package what CMake builds: the library, its private libraries and the command."""
+"""Builds the library, its private libraries and the command with CMake and adds them to the package."""
 
 import os
 import pathlib

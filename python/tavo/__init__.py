@@ -4,7 +4,8 @@
     >>> song = tavo.analyze("song.mp3")
     >>> song.highlight_ms, song.tempo_bpm, song.beats[:3]
 
-libtavo.so analyses one song at a time in a process; the command tavo analyses several at once.
+analyze runs libtavo.so in this process, one song at a time. analyze_many runs the command tavo,
+which analyses several songs at once.
 """
 
 from ._library import analyze

@@ -1,4 +1,4 @@
-"""Analyses one song at a time, by libtavo.so in this process."""
+"""Analyses one song at a time with libtavo.so in this process."""
 
 from __future__ import annotations
 
@@ -63,12 +63,12 @@ def analyze(song: Union[Path, Samples], rate: Optional[int] = None, *, mode: str
         floats with full scale 1.0. The mean of the channels is analysed.
     rate: sample rate of the samples in Hz; None for a file.
     mode: "highlight", "beats" or "both"; "both" finds the beats from the highlight on.
-    length: requested length of the highlight in seconds; 0 for none.
+    length: requested length of the highlight in seconds; 0 for no particular length.
     max_beats: maximum number of threshold-selected beats; 0 for no limit.
 
-    Raises TavoError if the song cannot be read to its end or nothing was found in it, ValueError for
-    invalid arguments. Calls from several threads run one after another; analyze_many analyses several
-    songs at once.
+    Raises TavoError if the song cannot be read to its end or nothing is found in it, and ValueError
+    for invalid arguments. Calls from several threads run one after another; analyze_many analyses
+    several songs at once.
     """
     number = check(mode, length, max_beats)
     if isinstance(song, (str, bytes, os.PathLike)):
@@ -113,7 +113,7 @@ def _analyze(lib: ctypes.CDLL, name: bytes, path: str, mode: int, length: int,
         started = lib.tavo_analyze(tavo, length, max_beats, 0)
         if started != 0:
             raise TavoError(path, _reason(lib, started))
-        while not done.wait(0.5):  # a wait without a limit would delay Ctrl-C
+        while not done.wait(0.5):  # a wait without a timeout would delay Ctrl-C
             pass
         if not lib.tavo_is_complete(tavo):
             raise TavoError(path, "The file could not be read to its end.")

@@ -1,6 +1,6 @@
-"""Paths of the library and the command, relative to this package.
+"""Finds the library and the command relative to this package.
 
-The two constants are for a wheel, which contains both. cmake --install replaces them.
+The two constants are the paths in a wheel. cmake --install replaces them.
 """
 
 import os

@@ -1,4 +1,4 @@
-"""Analyses many songs with the command tavo, whose worker processes run several at once."""
+"""Analyses many songs with the command tavo, which runs several at once in worker processes."""
 
 from __future__ import annotations
 
@@ -25,10 +25,11 @@ def analyze_many(
 ) -> Iterator[Union[Result, TavoError]]:
     """Analyses several songs at a time and yields their results in the order of the paths.
 
-    If a song cannot be analysed, its result is a TavoError; the others continue.
+    If a song cannot be analysed, its result is a TavoError; the others are still analysed.
+    paths: files and folders. A folder stands for the songs in it.
     jobs: number of worker processes, each with one song at a time; None for one per processor.
     progress: called after each song with the number of finished songs and the number of paths.
-    mode, length, max_beats: as for analyze. A folder stands for the songs in it.
+    mode, length, max_beats: as for analyze.
     """
     check(mode, length, max_beats)
     names = [os.fsencode(path) for path in paths]

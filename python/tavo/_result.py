@@ -11,7 +11,7 @@ import numpy.typing as npt
 
 Path = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
 Mode = Literal["highlight", "beats", "both"]
-MODES = ("highlight", "beats", "both")  # in the order of the library's numbers
+MODES = ("highlight", "beats", "both")  # the index is the library's number
 
 
 @dataclass(frozen=True, eq=False)
@@ -21,12 +21,12 @@ class Result:
     path: the file as it was named; "" for samples.
     highlight_ms: start of the highlight in milliseconds; None in mode "beats".
     beats: times in seconds, ascending; float64, shape (beats,), read-only; empty in mode "highlight".
-    tempo_bpm: beats per minute, in mode "both" of the music from the highlight on; None in mode
-        "highlight".
+    tempo_bpm: tempo in beats per minute; in mode "both", that of the music from the highlight on; None in
+        mode "highlight".
     duration_s: length of the stream in seconds.
     sample_rate: sample rate of the stream in Hz.
 
-    Results are equal if all their values are. They are hashable.
+    Results are hashable, and equal if all their values are equal.
     """
 
     path: str
@@ -58,7 +58,7 @@ class Result:
         return "".join(f"{time:.6f}\n" for time in self.beats)
 
     def to_jams(self) -> Dict[str, Any]:
-        """Returns the result in JAMS: the namespaces beat and tempo, and a tag_open "highlight" at its start."""
+        """Returns the result as JAMS: beat and tempo annotations, and a tag_open "highlight" where it starts."""
         annotations = []
         if self.tempo_bpm is not None:
             start = self.highlight_ms / 1000.0 if self.highlight_ms is not None else 0.0
@@ -91,7 +91,7 @@ def _observation(time: float, duration: float, value: Union[int, str, None]) -> 
 
 
 class TavoError(Exception):
-    """A song that could not be analysed. str() is a sentence; path names the file."""
+    """The reason why a song could not be analysed. str() gives it as a sentence; path names the file."""
 
     def __init__(self, path: Path, sentence: str) -> None:
         super().__init__(sentence)
@@ -99,7 +99,7 @@ class TavoError(Exception):
 
 
 def check(mode: str, length: int, max_beats: int) -> int:
-    """Returns the library's number of the mode. Raises ValueError for invalid arguments."""
+    """Returns the library's number for the mode. Raises ValueError for invalid arguments."""
     if mode not in MODES:
         raise ValueError(f"mode must be one of {', '.join(MODES)}, not {mode!r}")
     for name, value in (("length", length), ("max_beats", max_beats)):
