@@ -1,4 +1,4 @@
-// Functions for the page's worker. Strings are UTF-8. The caller frees a returned string with free.
+// Functions that the page's worker calls. Strings are UTF-8; the caller frees returned strings.
 #include <cstdint>
 #include <cstring>
 #include <string>
@@ -14,7 +14,7 @@ void store_result(TAVO_INFO *info, void *user) {
     *static_cast<TAVO_INFO *>(user) = *info;  // beat_times is valid until tavo_deinit
 }
 
-// Fills the record from a finished job, or its error.
+// Fills in the record from a finished job: its results or its error.
 void read_result(const TAVO_CTX *ctx, const TAVO_INFO &info, record &result) {
     result.has_highlight = result.mode != TAVO_MODE_BEATS;
     result.hl_pos_ms = info.hl_pos;
@@ -47,7 +47,7 @@ void analyse_song(record &result, int32_t max_beats) {
     result.has_stream = true;
     TAVO_INFO info{};
     tavo_set_listener(ctx, store_result, &info);
-    // tavo_analyze returns after the job, see threads.c.
+    // Here tavo_analyze returns after the job has ended; see threads.c.
     if (tavo_analyze(ctx, result.length_s, max_beats, 0) == TAVO_OK) {
         read_result(ctx, info, result);
     } else {
@@ -58,8 +58,9 @@ void analyse_song(record &result, int32_t max_beats) {
 
 }  // namespace
 
-// Analyses the WAV file at `path`. channels: of the song before the downmix. Returns JSON: "song"
-// for song.js and "result" in the form of --format json; without "song" if the analysis failed.
+// Analyses the WAV file at `path`. `channels` is the channel count of the song before the downmix.
+// Returns JSON with "song", which song.js shows, and "result", which has the form of --format json.
+// If the analysis fails, there is only "result".
 extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, int32_t max_beats,
                              int32_t channels) {
     fnamedec = "";
@@ -78,8 +79,7 @@ extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, i
     return strdup(out.dump().c_str());
 }
 
-// Returns the content of the marker file of a result, or null for an unknown format. result: the
-// "result" of web_analyse.
+// Returns a marker file's content for a "result" of web_analyse, or null for an unknown format.
 extern "C" char *web_markers(const char *result, int32_t length_s, const char *format,
                              const char *fps) {
     record song = record_from_json(result);

@@ -1,4 +1,4 @@
-// The formats of the page: only WAV, because the page decodes the song and passes it as WAV.
+// The page's format table. It contains only WAV, because the browser decodes the songs.
 #include "media_source/format_table.h"
 
 const format_ops *format_ops_of(int32_t type) {

@@ -1,5 +1,4 @@
-// The list of songs. The browser decodes a file, passes it to a worker as WAV, and shows the
-// result.
+// The page's list of songs. The browser decodes each file, and a worker analyses it as WAV.
 const code = URL.createObjectURL(new Blob([byId("enginecode").textContent], { type: "text/javascript" }));
 const wasm = byId("wasm").textContent;
 const songPage = JSON.parse(byId("songpage").textContent);
@@ -7,7 +6,7 @@ const RATE = 44100;  // Hz
 const queue = [];
 let busy = false, done = 0, stopCurrent = null, shown = null;
 
-// Returns a WAV file in 16-bit mono; each sample is the mean of all channels.
+// Returns the sound as a 16-bit mono WAV file. Each sample is the mean of all channels.
 function wavOf(sound) {
   const count = sound.length, wav = new ArrayBuffer(44 + 2 * count), head = new DataView(wav);
   const text = (at, letters) => [...letters].forEach((c, i) => head.setUint8(at + i, c.charCodeAt(0)));
@@ -25,7 +24,7 @@ function wavOf(sound) {
   return wav;
 }
 
-// Runs one request in a new worker. Returns null if it was stopped.
+// Runs one request in a new worker. Resolves to the reply, or to null if the request was stopped.
 function work(request, transfer = []) {
   const worker = new Worker(code);
   return new Promise((resolve) => {
@@ -104,7 +103,7 @@ function add(files) {
   run();
 }
 
-// Shows the page of --report with this song's data.
+// Shows the song on the page of --report.
 function show(entry) {
   if (shown) URL.revokeObjectURL(shown.song.audio);
   shown = entry;

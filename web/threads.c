@@ -1,5 +1,5 @@
-// pthread functions for a page without threads. The first thread, the job's, runs to its end inside
-// pthread_create. The threads that the job would start fail, so it does their work itself.
+// Replaces the pthread functions on a page without threads. pthread_create runs the job's thread to
+// its end before it returns. Inside the job it fails, so the job does all the work itself.
 #include <errno.h>
 #include <pthread.h>
 #include <setjmp.h>

@@ -1,5 +1,5 @@
 "use strict";
-// Each worker handles one song or one marker file. Ending it frees its memory.
+// Each worker handles one song or one marker file. Terminating the worker frees its memory.
 self.onmessage = async ({ data }) => {
   try {
     const packed = Uint8Array.from(atob(data.wasm), (c) => c.charCodeAt(0));
