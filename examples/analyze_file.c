@@ -1,6 +1,6 @@
-/* analyze_file FILE [SECONDS]: prints a song's stream, where its highlight starts, and the tempo
- * and the beats from there on; times are in milliseconds. SECONDS is the length of the highlight
- * wanted, 30 unless given.
+/* analyze_file FILE [SECONDS]: prints the format of a song, the start of its highlight, and the
+ * tempo and the beats from there on. Times are in milliseconds. SECONDS is the highlight's wanted
+ * length, 30 by default.
  *
  * cc analyze_file.c -o analyze_file $(pkg-config --cflags --libs tavo)
  */
@@ -13,7 +13,7 @@
 struct result {
     pthread_mutex_t lock;
     pthread_cond_t changed;
-    TAVO_INFO *info; /* null until the job has ended; owned by the library, until tavo_deinit */
+    TAVO_INFO *info; /* null until the job has ended; valid until tavo_deinit */
 };
 
 /* Runs on a thread of the library, where tavo_deinit is not allowed. */
@@ -32,7 +32,7 @@ static const TAVO_INFO *wait_for_result(struct result *result) {
     return result->info;
 }
 
-/* tavo_init has one code for every unusable file; tavo_probe returns the reason. */
+/* tavo_init returns the same code for every unusable file; tavo_probe returns the reason. */
 static int print_reason(const char *path) {
     int32_t code = tavo_probe(path, NULL);
     if (code == TAVO_OK) code = TAVO_ERR_MEMORY;

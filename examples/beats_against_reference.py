@@ -1,9 +1,9 @@
 #!/usr/bin/env python3
 """beats_against_reference.py SONG REFERENCE [PICTURE]
 
-Compares the beats that tavo finds with a reference: a text file with one time in seconds per line, as
-annotators write it. Prints precision, recall and F-measure at 70 ms, computed by mir_eval (Debian:
-python3-mir-eval). With PICTURE, and matplotlib installed, both lists are drawn.
+Compares the beats that tavo finds with a reference annotation: a text file with one time in seconds per
+line. Prints precision, recall and F-measure at 70 ms, computed by mir_eval (Debian: python3-mir-eval).
+With PICTURE, also draws both lists to that file, which needs matplotlib.
 """
 import sys
 
@@ -24,7 +24,7 @@ def main() -> int:
     except tavo.TavoError as error:
         print(f"{error.path}: {error}", file=sys.stderr)
         return 1
-    # mir_eval's scores for beats ignore the first 5 s, but its scores for onsets do not.
+    # mir_eval's beat scores ignore the first 5 s, so its onset scores are used.
     f_measure, precision, recall = mir_eval.onset.f_measure(reference, song.beats, window=TOLERANCE)
     print(f"tempo {song.tempo_bpm} BPM, {len(song.beats)} beats, {len(reference)} in the reference")
     print(f"precision {precision:.3f}  recall {recall:.3f}  F-measure {f_measure:.3f}")
