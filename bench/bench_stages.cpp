@@ -1,5 +1,5 @@
-// Time of a job by stage, for a 3-minute stereo song at 120 BPM. The lines whose names start with
-// "mode 1" add up to a whole mode-1 job of a 44.1 kHz file.
+// Measures the time of each stage of a job, for a 3-minute stereo song at 120 BPM. The benchmarks
+// whose names start with "mode 1" add up to a complete mode-1 job of a 44.1-kHz file.
 #include <benchmark/benchmark.h>
 
 #include <cstdlib>
@@ -21,8 +21,8 @@
 
 namespace {
 
-constexpr int32_t kMinuteFrames = 2584;  // hops in the tempo's one-minute excerpt
-constexpr int32_t kSecondMinute = 2583;  // its first hop in a song of two minutes or more
+constexpr int32_t kMinuteFrames = 2584;  // hops in the one-minute excerpt that gives the tempo
+constexpr int32_t kSecondMinute = 2583;  // first hop of the excerpt, if the song has two minutes
 constexpr int32_t kTempoTransform = 4096;
 constexpr int32_t kTempoLags = 86;
 
@@ -89,7 +89,7 @@ void highlight(benchmark::State &state) {
     }
 }
 
-// A beat analysis up to the measured stage.
+// The state of a beat analysis before the measured stage.
 struct analysis {
     std::vector<double> ana;
     TAVO_ONSET_CTX onset{};
@@ -157,7 +157,7 @@ void placement(benchmark::State &state) {
     analysis a;
     open_analysis(&a);
     _getOnsetEnvelope(&a.beat, kFrameSize, kHopSize);
-    // Larger than any result: every analysis frame and every added beat.
+    // Large enough for any result: one beat per analysis frame, and every added beat.
     std::vector<float> beats(static_cast<size_t>(a.beat.frame_count) + 50);
     for (auto _ : state) {
         benchmark::DoNotOptimize(getBeatCandi_MT(&a.beat, &a.onset, beats.data()));

@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # bench/compare.sh [-n PAIRS] [-m MODE] FILE...
-# Compares a whole analysis of each file with decoding the same file with ffmpeg. Runs them alternately in pairs and
-# prints a Markdown table of the medians of wall time, processor time and peak memory, and the median ratios of the
-# pairs. Uses build/release/bin/tavo, or the command that TAVO names. Close other programs
-# first; on a busy machine, rely on the ratios of processor time only.
+# Compares a complete analysis of each file with decoding the same file with ffmpeg. Runs the two alternately, in pairs,
+# and prints a Markdown table of the medians of wall time, processor time and peak memory, and of the ratios within the
+# pairs. Uses build/release/bin/tavo, or the command that TAVO names. Close other programs first; on a busy machine,
+# rely only on the ratios of processor time.
 set -euo pipefail
 tavo=${TAVO:-$(dirname -- "${BASH_SOURCE[0]}")/../build/release/bin/tavo}
 exec python3 - "$tavo" "$@" <<'END'
@@ -21,7 +21,7 @@ args = parser.parse_args(sys.argv[2:])
 
 
 def measure(words):
-    """Wall and processor seconds, peak MiB."""
+    """Returns wall time and processor time in seconds, and peak memory in MiB."""
     start = time.monotonic()
     child = os.fork()
     if child == 0:
