@@ -1,5 +1,5 @@
-// Shared by the fuzzers. Each fuzzer turns bytes into valid arguments and aborts if a promise is
-// broken. Choices come from the end of an input, so that an audio file can be an input.
+// Code that the fuzzers share. Each fuzzer turns an input's bytes into valid arguments and aborts
+// if the library breaks a promise. Choices come from an input's end, so any audio file can be one.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 
@@ -18,15 +18,15 @@ namespace fuzz {
 
 using input = FuzzedDataProvider;
 
-// Ends the program if the promise does not hold. libFuzzer then stores the input.
+// Prints the promise and aborts if `condition` is false. libFuzzer then stores the input.
 inline void must(bool condition, const char *promise) {
     if (condition) return;
     fprintf(stderr, "fuzz: broken: %s\n", promise);
     abort();
 }
 
-// Reads at most `count` values on one of three scales: small whole numbers, often equal; 0 to 1;
-// any bits, including infinities and NaN.
+// Reads at most `count` values of one of three kinds: small integers, many of them equal; numbers
+// from 0 to 1; or any bits, including infinities and NaN.
 template <typename T>
 std::vector<T> values(input *in, size_t count) {
     const int scale = in->ConsumeIntegralInRange(0, 2);
@@ -39,7 +39,7 @@ std::vector<T> values(input *in, size_t count) {
     return list;
 }
 
-// Reads `count` values and fills the missing ones with zeros.
+// Reads up to `count` values and appends zeros until there are `count`.
 template <typename T>
 std::vector<T> padded_values(input *in, size_t count) {
     std::vector<T> list = values<T>(in, count);
@@ -54,14 +54,13 @@ void run_one(void (*const (&functions)[count])(input *), const uint8_t *data, si
     functions[in.ConsumeIntegralInRange<size_t>(0, count - 1)](&in);
 }
 
-// Replaces a file's contents.
 inline void replace_contents(int fd, const std::vector<uint8_t> &bytes) {
     must(ftruncate(fd, 0) == 0, "a file is emptied");
     must(pwrite(fd, bytes.data(), bytes.size(), 0) == static_cast<ssize_t>(bytes.size()),
          "a file is written");
 }
 
-// Returns the path of a file with these bytes, which replaces the previous one.
+// Writes the bytes to a file in memory and returns its path. The next call overwrites the file.
 inline std::string write_file(const std::vector<uint8_t> &bytes) {
     static const int fd = memfd_create("input", MFD_CLOEXEC);
     replace_contents(fd, bytes);

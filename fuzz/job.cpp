@@ -1,5 +1,5 @@
-// A whole job: any file, any mode, with all its threads. Bytes that are generated after the input
-// turn a short song into one of minutes.
+// Fuzzes a complete job with all its threads, for any file and any mode. Bytes generated after the
+// input turn a short song into one that lasts minutes.
 #include "fuzz/fuzz.h"
 #include "tests/support/job_harness.h"
 
@@ -7,7 +7,7 @@ namespace {
 
 using fuzz::must;
 
-// Appends clicks over quiet noise, as 16-bit samples and as arbitrary bytes.
+// Appends clicks over quiet noise as 16-bit samples. In other formats they are arbitrary bytes.
 void pad(std::vector<uint8_t> *song, size_t bytes) {
     uint32_t noise = 1;
     for (size_t i = 0; i < bytes; i += 2) {

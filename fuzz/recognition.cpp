@@ -1,5 +1,5 @@
-// Recognition of a file's format. Zeros in the middle make a short input reach the limit of the
-// scan, 32 KiB.
+// Fuzzes the recognition of a file's format. Zeros inserted in the middle make a short input reach
+// the scan's limit, 32 KiB.
 #include "fuzz/fuzz.h"
 #include "media_source/mtsrc.h"
 
@@ -9,10 +9,10 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
                                   kMtsrcTypeMpegLayer2, kMtsrcTypeMpegLayer3, kMtsrcTypeFlac,
                                   kMtsrcTypeUnknown};
     fuzz::input in(data, size);
-    const bool far = in.ConsumeIntegralInRange(0, 31) == 31;  // a hundred times slower
+    const bool far = in.ConsumeIntegralInRange(0, 31) == 31;  // rare, being a hundred times slower
     const auto gap = far ? in.ConsumeIntegralInRange<size_t>(32'000, 32'764) : 0;
-    const int64_t start =
-        in.ConsumeBool() ? 3 : 0;  // recognition starts at the current file offset
+    // Recognition starts at the current file offset.
+    const int64_t start = in.ConsumeBool() ? 3 : 0;
     auto bytes = in.ConsumeRemainingBytes<uint8_t>();
     bytes.insert(bytes.begin() + static_cast<ptrdiff_t>(bytes.size() / 2), gap, 0);
     std::string path = fuzz::write_file(bytes);

@@ -1,6 +1,6 @@
 // replay RUNS DIR...: passes every file in the DIRs to the fuzzer's function, then RUNS inputs
-// derived from them, the same ones each time. After a failure the input is in the program's path
-// plus .last.
+// derived from them, which are the same each time. After a failure, the file PROGRAM.last contains
+// the input.
 #include <fcntl.h>
 
 #include <ctime>
@@ -18,8 +18,8 @@ size_t below(size_t limit) {
     return limit == 0 ? 0 : random_numbers() % limit;
 }
 
-// Returns a kept input, complete or truncated, with some changed bytes, half of the time near its
-// start, and random choices at its end; or only random bytes.
+// Returns random bytes, or a kept input that ends in random choices, may be truncated and has some
+// changed bytes, half of the time near its start.
 bytes next_input(const std::vector<bytes> &kept) {
     const auto random_byte = [] { return static_cast<uint8_t>(random_numbers()); };
     const bool random_only = below(2) == 0;

@@ -1,5 +1,5 @@
-// Any file as a media source: a stream has its stated duration, and reads of any size from any
-// position return the same bytes.
+// Fuzzes media sources with any file. A stream must have its stated duration, and reads of any size
+// from any position must return the same bytes.
 #include "common/tavo_ctx.h"
 #include "fuzz/fuzz.h"
 #include "media_source/mtsrc_ctx.h"
@@ -10,7 +10,7 @@ using fuzz::must;
 
 constexpr int32_t kBuffer = 2 * kQueueBytes;
 constexpr int32_t kNeverWritten = INT32_MIN;
-constexpr int64_t kUnknownOffset = -1;  // after a failure
+constexpr int64_t kUnknownOffset = -1;  // value of stream.at after a failure
 
 struct stream {
     mtsrc_ctx *src = nullptr;
@@ -24,7 +24,7 @@ int64_t bytes_at(const stream &source, int64_t units) {
     return 2 * (units / kUnitsPerSecond * rate + units % kUnitsPerSecond * rate / kUnitsPerSecond);
 }
 
-// Requests `want` bytes and appends the delivered ones to `out`.
+// Requests `want` bytes and appends the delivered bytes to `out`.
 int32_t read(stream *source, int32_t want, std::vector<uint8_t> *out) {
     std::vector<uint8_t> buffer(static_cast<size_t>(std::clamp(want, 1, kBuffer)));
     mtsrc_frame frame = {buffer.data(), kNeverWritten};
@@ -57,7 +57,7 @@ bool seek(stream *source, int64_t position, int64_t *reached) {
     return true;
 }
 
-// Reads twice from one position: in one request and in several.
+// Reads twice from the same position, first in one request, then in several.
 void read_twice(stream *source, fuzz::input *in) {
     const int64_t end = source->format.duration;
     const int64_t positions[] = {INT64_MIN, -1, 0, 1, end - 1, end, end + 1, INT64_MAX};

@@ -1,5 +1,5 @@
-// The stages of the analysis: properties of their results, and comparisons with plain
-// implementations. Threads cannot start here, so workers run on the calling thread.
+// Fuzzes the stages of the analysis. Checks properties of their results and compares them with
+// plain implementations. Threads cannot start here: the calling thread does all work.
 #include <pthread.h>
 
 #include <cerrno>
@@ -35,7 +35,7 @@ std::vector<int16_t> read_pcm(fuzz::input *in, size_t max_samples) {
     return pcm;
 }
 
-// --- 3: conversion
+// --- Stage 3: conversion
 
 int32_t choose_rate(fuzz::input *in) {
     return in->ConsumeBool() ? in->ConsumeIntegralInRange(1, 192'000)
@@ -44,7 +44,7 @@ int32_t choose_rate(fuzz::input *in) {
 }
 
 // A plain implementation of the windowed-sinc converter. Returns the number of samples appended to
-// out, or -1 for a phase out of range.
+// `out`, or -1 for a phase out of range.
 int64_t convert_by_definition(const dorn_resampler_state &s, const std::vector<int16_t> &in,
                               std::vector<int16_t> *out) {
     const auto len = static_cast<int64_t>(in.size());
@@ -74,15 +74,15 @@ int64_t convert_by_definition(const dorn_resampler_state &s, const std::vector<i
     }
 }
 
-// Compares the interpolator, with several channels, and whole conversions. Their output consists of
-// samples of the interpolator or of block means, then of zero bytes.
+// Compares the interpolator, for several channels, and complete conversions with plain ones. A
+// conversion outputs the interpolator's samples or block means, followed by zeros.
 void convert(fuzz::input *in) {
     const auto state = std::make_unique<dorn_resampler_state>();
     const int32_t target = in->ConsumeBool() ? kAnalysisRate : choose_rate(in);
     const bool whole = in->ConsumeBool();
     const int32_t source = whole ? target * in->ConsumeIntegralInRange(1, 8) : choose_rate(in);
     const int32_t channels = in->ConsumeIntegralInRange(1, 3);
-    const bool odd = in->ConsumeBool();  // one byte more
+    const bool odd = in->ConsumeBool();  // the input has an extra byte
     const std::vector<int16_t> pcm = read_pcm(in, 2000);
     const auto count = static_cast<int64_t>(pcm.size());
     if (pcm.empty() || count * target / source > 8000) return;
@@ -90,8 +90,8 @@ void convert(fuzz::input *in) {
     std::vector<int16_t> samples;
     const int64_t code = convert_by_definition(*state, pcm, &samples);
     std::vector<int16_t> out(std::max<size_t>(samples.size(), 1));
-    std::vector<int16_t> loud(pcm.size() + 200,
-                              INT16_MAX);  // samples outside the input must not count
+    // Samples outside the input must not affect the output.
+    std::vector<int16_t> loud(pcm.size() + 200, INT16_MAX);
     std::copy(pcm.begin(), pcm.end(), loud.begin() + 100);
     must(dorn_resampler_convert(state.get(), &loud[100], static_cast<int32_t>(count), out.data()) ==
              code,
@@ -117,9 +117,9 @@ void convert(fuzz::input *in) {
     free(output);
 }
 
-// --- 7: the highlight
+// --- Stage 7: the highlight
 
-// Returns `count` ascending positions below `n`. The list has at least `capacity` entries.
+// Returns `count` ascending positions below `n`, in a list of at least `capacity` entries.
 std::vector<int32_t> choose_positions(fuzz::input *in, size_t count, size_t capacity, int32_t n) {
     std::vector<int32_t> list(count);
     for (int32_t &at : list) at = in->ConsumeIntegralInRange(0, n - 1);
@@ -165,9 +165,9 @@ void search_curve(fuzz::input *in) {
     must(!plain || _get_HL_simple(&hl, duration) == start, "a start does not depend on the volume");
 }
 
-// --- 4 to 6: beats
+// --- Stages 4 to 6: beats
 
-// Computes tempo, threshold, candidates and gaps of an envelope that repeats its values.
+// Runs the tempo estimate, the threshold and the beat selection on an envelope of repeated values.
 void find_beats(fuzz::input *in) {
     const int32_t limit = in->ConsumeIntegralInRange(-2, 40);
     const int32_t free_tempo = in->ConsumeBool() ? in->ConsumeIntegralInRange(30, 200) : 0;

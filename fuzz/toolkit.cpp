@@ -1,4 +1,4 @@
-// The functions of dsp/, each compared with its definition.
+// Fuzzes the functions of dsp/ and compares each with its definition.
 #include <complex>
 
 #include "dsp/dft.h"
@@ -18,8 +18,8 @@ struct signal {
     std::vector<double> re, im;
 };
 
-// Term `k` of the discrete Fourier transform of the first `count` values of `x`. sign: -1 for the
-// forward transform, 1 for the inverse, which divides by n.
+// Returns term `k` of the discrete Fourier transform of the first `count` values of `x`. `sign` is
+// -1 for the forward transform and 1 for the inverse, which divides by n.
 std::complex<double> sum_at(const signal &x, int count, int k, int sign) {
     const auto n = static_cast<int>(x.re.size());
     std::complex<double> sum = 0.0;
@@ -31,7 +31,7 @@ std::complex<double> sum_at(const signal &x, int count, int k, int sign) {
     return sign < 0 ? sum : sum / static_cast<double>(n);
 }
 
-// Checks that the first `outputs` values of y transform the first `inputs` values of x.
+// Checks that the first `outputs` values of `y` are the transform of the first `inputs` of `x`.
 void check_sums(const signal &y, int outputs, const signal &x, int inputs, int sign) {
     double norm = 0.0;
     for (size_t i = 0; i < x.re.size(); ++i) norm += std::fabs(x.re[i]) + std::fabs(x.im[i]);
@@ -87,9 +87,9 @@ std::vector<int64_t> peaks_of(const std::vector<T> &x) {
     return peaks;
 }
 
-// Checks that `out` starts with the expected positions. Then come the peaks, largest first, except
-// those within `radius` of an earlier position; `out` has at most max_count entries. Equal peaks
-// may be in any order.
+// Checks that `out` contains the `expected` positions, followed by the peaks in descending order of
+// height, except those within `radius` of an earlier position. `out` has at most max_count entries.
+// Peaks of equal height may be in any order.
 template <typename T, typename Index>
 void check_peaks(const std::vector<T> &x, const std::vector<Index> &out,
                  std::vector<int64_t> expected, int64_t radius, size_t max_count = SIZE_MAX) {
@@ -149,7 +149,7 @@ void find_priority_peaks(fuzz::input *in) {
     if (count < 0) return;
     out.resize(static_cast<size_t>(count));
     const std::vector<int64_t> peaks = peaks_of(x);
-    std::vector<int64_t> pinned;  // the nearest peak to each position, except the last peak
+    std::vector<int64_t> pinned;  // the peak nearest to each position, except the last peak
     for (const int32_t position : priority) {
         if (peaks.size() < 2) break;
         const int64_t nearest = *std::min_element(
@@ -160,7 +160,7 @@ void find_priority_peaks(fuzz::input *in) {
     check_peaks(x, out, pinned, int64_t{distance} - 1);
 }
 
-// Returns the bits of the values, sorted.
+// Returns the bit patterns of the values, sorted.
 std::vector<uint64_t> bits_of(const std::vector<double> &values) {
     std::vector<uint64_t> bits(values.size());
     if (!values.empty()) memcpy(bits.data(), values.data(), 8 * values.size());
