@@ -1,13 +1,13 @@
-# cmake --install. The public header goes to include/tavo, which the CMake package and tavo.pc add to the include
-# path. All files find each other by relative paths.
+# Rules of cmake --install. The public header is installed in include/tavo, which the CMake package and tavo.pc add to
+# the include path. The installed files find each other by relative paths.
 set(headers_dir ${CMAKE_INSTALL_INCLUDEDIR}/tavo)
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/tavo)
 install(FILES include/tavo.h DESTINATION ${headers_dir})
 install(TARGETS tavo EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}
   INCLUDES DESTINATION ${headers_dir})
 
-# A device has these two. On a desktop they are private, because their names are too common for a folder that every
-# program searches. Debian's android-liblog has another liblog.
+# A device brings these two libraries. On a desktop they are installed in a private folder, because their names are
+# too common for one that every program searches; Debian's android-liblog, for example, contains another liblog.
 if(NOT ANDROID)
   install(TARGETS log wexaaudio EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)
   install(TARGETS wexaaudio_av DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)  # wexaaudio loads it

@@ -1,4 +1,4 @@
-# cpack: a .tar.gz of the installed files. debian/ builds the Debian packages; scripts/test-package.sh tests both.
+# cpack makes a .tar.gz of the installed files. debian/ builds the Debian packages. scripts/test-package.sh tests both.
 set(CPACK_GENERATOR TGZ)
 set(CPACK_PACKAGE_DESCRIPTION_SUMMARY ${PROJECT_DESCRIPTION})
 set(CPACK_PACKAGE_CONTACT "tavo maintainers <maintainers@tavo.invalid>")

@@ -8,7 +8,7 @@ _tavo() {
             return
         fi
     done
-    # --name=value reaches us as three words.
+    # Bash splits --name=value into three words.
     if [[ $word == '=' ]]; then
         word=
     elif [[ $before == '=' ]]; then

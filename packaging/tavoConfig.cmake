@@ -1,2 +1,2 @@
-# find_package(tavo): defines the target tavo::tavo, the library with its header tavo.h.
+# find_package(tavo) defines the target tavo::tavo, the library with its header tavo.h.
 include(${CMAKE_CURRENT_LIST_DIR}/tavoTargets.cmake)
