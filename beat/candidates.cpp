@@ -12,7 +12,7 @@ constexpr double kMinute = 60.0;         // seconds
 constexpr int32_t kSlowBpm = 95;         // up to this tempo, beats are at least kSlowSpan apart
 constexpr float kSlowSpan = 3.0f;        // seconds
 constexpr float kFastSpan = 1.0f;        // seconds
-constexpr int32_t kBeatPerFrame = 2583;  // BPM, the fastest tempo: one beat per analysis frame
+constexpr int32_t kBeatPerFrame = 2583;  // fastest tempo: BPM of one beat per analysis frame
 constexpr double kWindowBeats = 4.0;     // length of the threshold's window in beat periods
 constexpr float kMsPerSecond = 1000.0f;
 

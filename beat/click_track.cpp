@@ -70,7 +70,7 @@ void copy_blips(const float *blip, int64_t length, const float *beats, int32_t c
     }
 }
 
-// Mixes a sample of the signal with one of the blip track. Returns the low 16 bits of the result.
+// Mixes a sample of the signal with a sample of the blip track. Returns the low 16 bits.
 uint32_t mix_sample(double signal, float blip) {
     const double mixed = (signal * kFullScale + blip * kBlipGain * kFullScale) * 0.5;
     if (!(fabs(mixed) < INT32_MAX)) return 0;

@@ -41,8 +41,8 @@ struct mel_term {
     const double_pair *power;  // power of the weight's bin
 };
 
-// Scratch memory of one worker. In each pair, lane 0 belongs to analysis frame k and lane 1 to the
-// next one.
+// Scratch memory of one worker. In each double_pair, lane 0 belongs to analysis frame k and lane 1
+// to the next one.
 struct worker_scratch {
     double *samples;         // [N + H] scaled samples of both frames
     double_pair *transform;  // [2 N]
@@ -162,8 +162,9 @@ double spectral_flux(const double *row, const double *next) {
     return sum / kMelBands;
 }
 
-// Computes the spectral flux into analysis frames `k` to `end` - 1 from the ones before them. The
-// frame before the worker's first one belongs to another worker, so fill_envelope adds that flux.
+// Computes the spectral flux of analysis frames `k` to `end` - 1, comparing each with the frame
+// before it. The frame before the worker's first one belongs to another worker, so fill_envelope
+// compares those two.
 void compute_flux(group_worker *record, int64_t k, int64_t end) {
     for (; k < end; ++k) {
         const double *row = record->rows[k % kRows];

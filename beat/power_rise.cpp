@@ -18,8 +18,8 @@ constexpr int64_t kChunk = 256;         // sums computed in one step; even
 static_assert(kBlock % 2 == 0 && kSumRadius % 2 == 1);  // every block has an even number of sums
 constexpr int64_t kLookAhead = 8;    // blocks in the mean of the next four seconds
 constexpr int64_t kRiseApart = 7;    // blocks from a rise to the next possible one
-constexpr double kMeanStep = 4.0;    // dB that the quiet blocks must be below the mean ahead
-constexpr double kLoudMargin = 3.0;  // dB that the loud part may be below the 60th percentile
+constexpr double kMeanStep = 4.0;    // dB; the quiet blocks must be this far below the mean ahead
+constexpr double kLoudMargin = 3.0;  // dB; the loud part may be this far below the 60th percentile
 
 // The levels of all blocks. Block b consists of the samples (b - 1) * kBlock + 1 to b * kBlock,
 // except that block 1 starts at sample kSumRadius.
@@ -47,7 +47,7 @@ void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
         const int64_t part = std::min(kChunk, count - done);
         const int64_t used = part + 2 * kSumRadius - 1;
         scale_samples({view.samples + (first + done - kSumRadius), view.full_scale}, used, squares);
-        for (double &square : squares) square *= square;  // the fixed count allows vectorising
+        for (double &square : squares) square *= square;  // the fixed count allows vectorisation
         for (int64_t j = 0; j < part; j += 2) {
             const auto two = [p = squares + j](int64_t k) { return load_pair(p + k); };
             const double_pair sum = two(0) + two(1) + two(2) + two(3) + two(4) + two(5) + two(6) +

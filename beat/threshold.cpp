@@ -76,7 +76,7 @@ void run_thres_worker(void *record) {
     free(win);
 }
 
-// Divides the indices that have a full window into four equal ranges. Without such an index, all
+// Divides the indices that have a full window into four equal ranges. If no index has one, all
 // ranges are empty. An index on a boundary belongs to the earlier worker only, so that no two
 // threads write the same value.
 void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,

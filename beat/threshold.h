@@ -31,7 +31,7 @@ void *_tavo_proc_beatcandi(void *record);
 void _thd_thres_cleanup(void *record);
 }
 
-// Fills thr[F - 1], which must be zeroed and have at least one entry, on four threads. `window` is
+// Fills thr[F - 1] on four threads. `thr` must be zeroed and have at least one entry; `window` is
 // in analysis frames and `hop` in seconds. Returns 0, or TAVO_ERR_MEMORY if memory runs out.
 int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, float hop, double *thr);
 

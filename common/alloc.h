@@ -65,8 +65,9 @@ void advise_huge_pages(void *buffer, int64_t bytes);
 // Returns null if memory runs out.
 uint8_t *allocate_buffer(int64_t bytes);
 
-// Gives the whole pages between `begin` and `end`, both in one heap buffer, back to the system.
-// They stay allocated and read as zeros. Returns the end of the last page released, or `begin`.
+// Gives the whole pages between `begin` and `end`, which point into one heap buffer, back to the
+// system. The pages stay allocated and read as zeros. Returns the end of the last page released, or
+// `begin` if the range holds no whole page.
 const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end);
 
 #endif

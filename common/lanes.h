@@ -1,5 +1,5 @@
-// Types of the compiler's vector extension, which hold several numbers in one register. Each lane
-// is rounded as a single number would be. Used where independent data needs the same arithmetic.
+// The compiler's vector types, each of which holds several numbers in one register. Each lane is
+// rounded as a single number would be. Used where independent data needs the same arithmetic.
 #ifndef TAVO_COMMON_LANES_H
 #define TAVO_COMMON_LANES_H
 

@@ -1,10 +1,10 @@
-// Runs a group of worker threads and waits for them. Used for decoding, block averages, the onset
-// envelope and the threshold.
+// Runs a group of worker threads and waits for them. Used by pcm/ and beat/ for decoding, block
+// averages, the onset envelope and the threshold.
 //
 // A group has one record per worker. The workers share a mutex, a condition and an array of done
 // flags. A worker's thread entry calls run_worker, and its completion handler calls
 // worker_group_done. The starting thread calls worker_group_run, which waits for all flags and
-// joins every thread. Only then does it read the results. Used by pcm/ and beat/.
+// joins every thread. Only then does it read the results.
 #ifndef TAVO_COMMON_WORKER_GROUP_H
 #define TAVO_COMMON_WORKER_GROUP_H
 

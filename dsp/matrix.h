@@ -1,4 +1,4 @@
-// Multiplies matrices of row pointers. Exported for direct callers; the library does not use it.
+// Multiplies matrices stored as row pointers. For direct callers; the library does not use it.
 #ifndef TAVO_DSP_MATRIX_H
 #define TAVO_DSP_MATRIX_H
 

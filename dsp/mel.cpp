@@ -7,7 +7,7 @@ namespace {
 constexpr float kBreakHz = 1000.0f;
 constexpr float kBreakMel = 15.0f;
 constexpr float kHzPerMel = 66.6667f;             // below the break
-constexpr double kLogStep = 0.06877952768077182;  // above the break: ln of the ratio per mel
+constexpr double kLogStep = 0.06877952768077182;  // above it: ln of the frequency ratio per mel
 
 }  // namespace
 

@@ -54,8 +54,8 @@ void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius)
     memset(marks + begin, kSuppressed, static_cast<size_t>(end - begin + 1));
 }
 
-// Writes the peaks that survive, in the order given and at most `limit` of them. Each one
-// suppresses its neighbours. Returns the number of peaks written.
+// Writes the peaks that survive, at most `limit` and in the given order. Each one suppresses its
+// neighbours. Returns the number of peaks written.
 template <typename Record, typename Index>
 int32_t write_survivors(const Record *peaks, int64_t count, uint8_t *marks, int64_t len,
                         int64_t radius, int64_t limit, Index *out) {

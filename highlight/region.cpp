@@ -2,12 +2,11 @@
 
 namespace {
 
-constexpr int32_t kMaxToValley =
-    25;                            // points (50 s): a valley further away does not end the region
-constexpr int32_t kScanBegin = 7;  // first point scanned after `chosen` (14 s)
-constexpr int32_t kScanEnd = 24;   // last point scanned after `chosen` (48 s)
-constexpr int64_t kMinLead = 3;    // points: a shorter lead does not move the start
-constexpr int64_t kNearIdeal = 2;  // points: a valley this close to the ideal start wins
+constexpr int32_t kMaxToValley = 25;  // points (50 s): more distant valleys do not end the region
+constexpr int32_t kScanBegin = 7;     // first point scanned after `chosen` (14 s)
+constexpr int32_t kScanEnd = 24;      // last point scanned after `chosen` (48 s)
+constexpr int64_t kMinLead = 3;       // points: a shorter lead does not move the start
+constexpr int64_t kNearIdeal = 2;     // points: a valley this close to the ideal start wins
 
 struct song_curve {
     const float *norm;

@@ -17,8 +17,8 @@ struct offset_range {
     int64_t end;
 };
 
-// Return the lowest and the highest offset, respectively, at which `pcm` contains the block, or
-// kNotFound.
+// Return the lowest and the highest offset in the range, respectively, at which `pcm` contains the
+// block, or kNotFound if it does not.
 int64_t find_lowest(const uint8_t *pcm, offset_range range, const uint8_t *block);
 int64_t find_highest(const uint8_t *pcm, offset_range range, const uint8_t *block);
 

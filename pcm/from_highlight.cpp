@@ -63,7 +63,8 @@ int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_
     return 0;
 }
 
-// Returns the size in bytes of a buffer planned from the segment's start to the end of the stream.
+// Returns the size in bytes of a PCM buffer that spans the time from the segment's start to the end
+// of the stream.
 int64_t planned_bytes(const TAVO_DECSEG *seg) {
     if (seg->duration == 0) return kUnknownBytes;
     int64_t units = 0;

@@ -68,8 +68,8 @@ bool works_in_place(const conversion &plan) {
 }
 
 // Returns a heap block that is large enough for the output, or null if memory runs out. If *owned
-// is not null and the conversion works in place, this is *owned, which may be enlarged and moved.
-// Otherwise it is new and zeroed.
+// is not null and the conversion works in place, the block is *owned, which may be enlarged and
+// moved. Otherwise it is new and zeroed.
 double *allocate_output(const conversion &plan, int16_t **owned) {
     void *memory = nullptr;
     if (*owned != nullptr && works_in_place(plan)) {
@@ -91,8 +91,7 @@ double *shrink_output(const conversion &plan, double *out) {
     return smaller == nullptr ? out : static_cast<double *>(smaller);
 }
 
-// Converts `pcm`. `owned` is `pcm` if this function must free the memory or reuse it for the
-// output, otherwise null.
+// Converts `pcm`. `owned` is `pcm` if this function must free or reuse its memory, otherwise null.
 int32_t convert(const int16_t *pcm, int16_t *owned, int64_t bytes, int32_t source_rate,
                 int32_t ana_rate, int64_t *out_len, double **out) {
     *out_len = 0;

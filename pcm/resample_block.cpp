@@ -13,7 +13,7 @@ pthread_cond_t *ext_cond_resample = nullptr;
 namespace {
 
 constexpr int32_t kParts = 4;
-constexpr int32_t kExactFloats = 1 << 24;  // a float holds any whole number up to here
+constexpr int32_t kExactFloats = 1 << 24;  // up to here, floats hold whole numbers exactly
 
 // Returns the number of outputs whose blocks have exactly `whole` samples. After them, positions
 // are rounded in single precision.

@@ -8,7 +8,7 @@
 #include <cstdint>
 
 constexpr int32_t kResamplePhases = 961;  // fractional offsets from -0.5 to 0.5 in steps of 1/960
-constexpr int32_t kResampleRow = 25;      // capacity of a row, the taps + 1 coefficients of a phase
+constexpr int32_t kResampleRow = 25;      // capacity of a row, which holds taps + 1 coefficients
 
 struct dorn_resampler_state {
     int32_t taps;      // 20 if the ratio is within 0.0001 of a whole number, otherwise 19
@@ -22,7 +22,7 @@ static_assert(offsetof(dorn_resampler_state, coef) == 12);
 extern "C" {
 
 // Fills a zeroed state. Returns 0, or -1 if the target rate is below 1 or the source rate is 0.
-// Accepts a negative source rate, but the conversion rejects the resulting table.
+// Accepts a negative source rate, but the conversion rejects the resulting state.
 int32_t dorn_resampler_prepare(dorn_resampler_state *state, int32_t source_rate,
                                int32_t target_rate, int32_t channels);
 
@@ -34,8 +34,8 @@ int32_t dorn_resampler_convert(const dorn_resampler_state *state, const int16_t 
 }
 
 // Same as dorn_resampler_convert, but writes at most max_frames output frames. On long inputs, the
-// single-precision position lags so far that the conversion would otherwise write more than the
-// rates allow.
+// single-precision position falls so far short that the conversion would otherwise write more than
+// the rates allow.
 int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
                        int16_t *out, int64_t max_frames);
 
