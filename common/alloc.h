@@ -22,12 +22,13 @@ inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *
 }
 
 // Computes the size in bytes of PCM that lasts `units` (100 ns each) at `rate` (Hz). The division
-// is the last step, so the size may be odd.
+// is the last step, so the size may be odd. Returns false as scale_size does.
 inline bool span_bytes(int64_t units, int32_t rate, int64_t *bytes) {
     return scale_size(units, rate * kBytesPerSample, kUnitsPerSecond, bytes);
 }
 
-// Computes the size in bytes of `count` items of `size` bytes, followed by `extra` bytes.
+// Computes the size in bytes of `count` items of `size` bytes, followed by `extra` bytes. Returns
+// false if `count` or `size` is negative or the result overflows.
 inline bool array_bytes(int64_t count, int64_t size, int64_t extra, int64_t *bytes) {
     return scale_size(count, size, 1, bytes) && !__builtin_add_overflow(*bytes, extra, bytes);
 }

@@ -2,7 +2,7 @@
 //
 // Input: a plan made by pcm/decode_plan.h. Output: pcm_bytes bytes in TAVO_CTX.pcm. The segments
 // are decoded in parallel and joined where their overlaps contain the same bytes (pcm/stitch.h).
-// Precedes highlight/position.h and pcm/resample.h.
+// Follows pcm/decode_plan.h and precedes highlight/position.h and pcm/resample.h.
 #ifndef TAVO_PCM_DECODE_H
 #define TAVO_PCM_DECODE_H
 
