@@ -1,5 +1,5 @@
 // Code that the fuzzers share. Each fuzzer turns an input's bytes into valid arguments and aborts
-// if the library breaks a promise. Choices come from an input's end, so any audio file can be one.
+// if the library breaks a promise. Choices come from the end, so any audio file can be an input.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 

@@ -74,7 +74,7 @@ int64_t convert_by_definition(const dorn_resampler_state &s, const std::vector<i
     }
 }
 
-// Compares the interpolator, for several channels, and complete conversions with plain ones. A
+// Compares the interpolator (for several channels) and complete conversions with plain ones. A
 // conversion outputs the interpolator's samples or block means, followed by zeros.
 void convert(fuzz::input *in) {
     const auto state = std::make_unique<dorn_resampler_state>();

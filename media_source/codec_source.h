@@ -48,14 +48,14 @@ struct codec_source {
 // Returns the index of the first audio entry of kinds[count], or -1.
 int32_t codec_source_first_audio(const int32_t *kinds, int32_t count);
 
-// Two values for codec_source.reduce. The first keeps the first channel. The second changes
-// nothing, for PCM that already has one channel.
+// Two functions for codec_source.reduce. The first keeps the first channel. The second is for PCM
+// that already has one channel, and changes nothing.
 int32_t codec_source_reduce_to_first(const mtsrc_ctx *src, int32_t bytes, int64_t first);
 int32_t codec_source_reduce_none(const mtsrc_ctx *src, int32_t bytes, int64_t first);
 
-// First step of opening a source. Calls `init`, a function of the codec library that returns 0 on
-// success. Returns 0 and sets demux, dstream and decoder to null, or returns TAVO_ERR_HANDLE for a
-// null handle, TAVO_ERR_OPEN without a probe file, or TAVO_ERR_CODEC if `init` fails.
+// Starts opening a source: calls `init`, a function of the codec library that returns 0 on success,
+// then sets demux, dstream and decoder to null. Returns 0, TAVO_ERR_HANDLE for a null handle,
+// TAVO_ERR_OPEN without a probe file, or TAVO_ERR_CODEC if `init` fails.
 int32_t codec_source_begin_open(mtsrc_ctx *src, int32_t (*init)());
 
 // Stores the decoder and the stream's format in the handle, which then owns the decoder. Returns 0,
@@ -63,7 +63,7 @@ int32_t codec_source_begin_open(mtsrc_ctx *src, int32_t (*init)());
 int32_t codec_source_set_decoder(mtsrc_ctx *src, const codec_ops &codec, void *decoder,
                                  const mtsrc_format &format);
 
-// Last step of opening a source, after success and failure alike. Frees the buffers of the tag
+// Finishes opening a source, whether the open succeeded or failed. Frees the buffers of the tag
 // record, which may be null. If `code` is a failure, also closes the source. Returns `code`.
 int32_t codec_source_end_open(const codec_source &source, mtsrc_ctx *src, wexa_tags *tags,
                               int32_t code);

@@ -6,7 +6,7 @@
 namespace {
 
 constexpr int32_t kBytesPerSample = 2;
-// Consecutive empty steps before giving up: more than four days of MPEG frames.
+// A read fails after this many consecutive empty steps, over four days of MPEG frames.
 constexpr int32_t kMaxEmptySteps = 16'777'216;
 
 void compact_queue(mtsrc_ctx *src) {

@@ -1,5 +1,5 @@
 // join.js OUT ENGINE.JS ENGINE.WASM TAVO.HTML PARTS...: writes the page to OUT. Replaces each
-// @NAME@ in the page by the part of that name.
+// @NAME@ in the page with the part of that name.
 const fs = require("fs");
 const zlib = require("zlib");
 const [out, engine, wasm, page, ...parts] = process.argv.slice(2);

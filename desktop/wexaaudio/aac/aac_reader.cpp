@@ -1,4 +1,4 @@
-// Reads AAC in ADTS form. Opening a file scans its frame headers, after any ID3v2 tags.
+// Reads AAC in ADTS form, which may follow ID3v2 tags. Opening a file scans all frame headers.
 //
 // Input: mtsrc_io. Output: PCM and the information record. Precedes copy_decoder.cpp.
 #include <cstring>
@@ -41,7 +41,8 @@ bool same_stream(const adts_header &a, const adts_header &b) {
 }
 
 // Returns the offset of the next frame at or after `offset`, or -1. Another frame or the end of the
-// file must follow it immediately. `reference` is a frame of the wanted stream, or null.
+// file must follow it immediately. `reference` is a frame of the wanted stream, or null for any
+// stream.
 int64_t find_frame(io_file *file, int64_t offset, const adts_header *reference, adts_header *h) {
     for (;; ++offset) {
         int32_t got = 0;

@@ -82,8 +82,8 @@ void put_general(bit_writer *w, const aac_config &config) {
 }
 
 // Adds spectral band replication and, if `parametric`, parametric stereo to the configuration.
-// Otherwise a decoder that starts at a frame without such data would never apply it. Does nothing
-// unless the object type is low complexity.
+// Without this, a decoder that starts at a frame without such data would never apply it. Does
+// nothing unless the object type is low complexity.
 void state_sbr(aac_config *config, bool parametric) {
     // Twice the core's rate is three entries up in the table.
     const int32_t extension = config->rate_index - 3;

@@ -10,7 +10,7 @@ typedef float float_quad __attribute__((vector_size(16)));
 typedef int32_t int_quad __attribute__((vector_size(16)));
 typedef uint32_t bits_quad __attribute__((vector_size(16)));
 constexpr ptrdiff_t kQuad = 4;
-static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__);  // for the pairs of pcm16_pair
+static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__);  // pcm16_pair packs two samples
 
 constexpr float kScale = 32768.0f;
 

@@ -23,7 +23,7 @@ constexpr uint32_t name_of(const char (&text)[5]) {
     return name;
 }
 
-// File offsets of the contents of a box, or of a level of boxes. Both are 0 for a missing box.
+// File offsets of a box's contents, or of a level: several boxes. Both are 0 for a missing box.
 struct span {
     int64_t from;
     int64_t to;

@@ -28,7 +28,7 @@ constexpr int32_t kVorbisHeaders = 3;           // packets: identification, comm
 constexpr int32_t kNameBytes = 7;               // packet type and "vorbis"
 constexpr int32_t kIdBytes = 30;                // of the identification packet
 constexpr int32_t kChannelsAt = 11;             // offset in the identification packet
-constexpr int32_t kRateAt = 12;                 // the same; 32 bits, little-endian
+constexpr int32_t kRateAt = 12;                 // offset in that packet; 32 bits, little-endian
 constexpr int32_t kMaxCodebooks = 1 << 20;      // bytes; real ones have 3 to 10 thousand
 constexpr int64_t kMaxGranule = INT64_MAX / 2;  // larger ones are clamped, so sums cannot overflow
 constexpr int32_t kMaxPacket32 = 1 << 26;       // bytes; comments may contain pictures
@@ -103,7 +103,7 @@ bool read_headers(ogg_scan *scan) {
     return scan->parser != nullptr;
 }
 
-// Adds a complete packet, a header or audio.
+// Adds a complete packet, which is a header or audio.
 bool add_packet(ogg_scan *scan) {
     if (scan->headers < kVorbisHeaders) {
         if (scan->packet_bytes < kNameBytes) return false;
