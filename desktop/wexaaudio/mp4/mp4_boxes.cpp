@@ -13,7 +13,7 @@ constexpr int64_t kFullHead = 4;        // bytes: version and flags of a full bo
 constexpr int64_t kMaxTable = 1 << 26;  // bytes; a day of audio needs less
 
 // Smallest plausible number of file bytes per frame. The shortest AAC frame of silence takes 4
-// bytes, and 4 more in the tables. Without this limit, frames that share their bytes could take
+// bytes, and 4 more in the tables. Without this limit, frames that share the same bytes could take
 // unlimited memory.
 constexpr int64_t kMinFrameBytes = 2;
 
