@@ -26,6 +26,15 @@ int write_all(int fd, std::string_view bytes) {
     return 0;
 }
 
+sighandler_t set_signal_handler(int number, sighandler_t handler) {
+    struct sigaction action {};
+    struct sigaction before {};
+    action.sa_handler = handler;
+    sigemptyset(&action.sa_mask);
+    sigaction(number, &action, &before);
+    return before.sa_handler;
+}
+
 std::string ending_text(int status) {
     if (WIFSIGNALED(status)) {
         const int number = WTERMSIG(status);

@@ -2,6 +2,7 @@
 #ifndef TAVO_CLI_SYSTEM_H
 #define TAVO_CLI_SYSTEM_H
 
+#include <csignal>
 #include <string>
 #include <string_view>
 
@@ -14,6 +15,10 @@ bool is_readable(int fd);
 
 // Writes all bytes and repeats interrupted calls. Returns 0 or errno.
 int write_all(int fd, std::string_view bytes);
+
+// Installs a signal handler, without SA_RESTART, so that a blocked read returns. Returns the
+// previous handler.
+sighandler_t set_signal_handler(int number, sighandler_t handler);
 
 // Describes how a process ended, from the status of waitpid: "by signal 9 (Killed)" or "with status
 // 1".

@@ -1,23 +1,19 @@
 // Explains why a file cannot be analysed. tavo_init returns the same code for every such file, so
 // the reason comes from the system or from tavo_probe.
+//
+// Input: the path that was passed to the library. Output: a sentence. Used by run/analyse.h.
 #ifndef TAVO_CLI_INPUT_EXPLAIN_H
 #define TAVO_CLI_INPUT_EXPLAIN_H
 
 #include <cstdint>
 #include <string>
 
-#include "cli/failure.h"
-#include "cli/run/record.h"
+#include "include/tavo.h"
 
-// Checks that the file at `path` is a readable regular file of sufficient size. Never blocks,
-// whatever kind of file it is.
-failure check_file(const std::string &path);
+// Returns the reason for `code`, which tavo_probe returned with `stream`, or TAVO_ERR_MEMORY.
+std::string explain_refusal(const std::string &path, int32_t code, const TAVO_STREAM &stream);
 
-// Returns the reason why tavo_init failed with `code`. path: as passed to the library. Stores
-// the known properties of the stream in result.
-failure explain_refusal(const std::string &path, int32_t code, record &result);
-
-// Refuses a file that states a longer duration than the user allows.
-failure check_duration(int64_t duration_ms, int32_t max_minutes);
+// Returns the reason why an analysis received no audio, or (has_audio) only the beginning.
+std::string explain_lost_audio(const std::string &path, bool has_audio);
 
 #endif

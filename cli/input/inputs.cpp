@@ -12,7 +12,7 @@
 
 #include "cli/input/ffmpeg.h"
 #include "cli/input/recognise.h"
-#include "cli/input/short_path.h"
+#include "cli/input/song_file.h"
 #include "cli/write/clip.h"
 #include "cli/write/file_names.h"
 #include "cli/write/markers.h"
@@ -20,8 +20,6 @@
 #include "include/tavo.h"
 
 namespace {
-
-constexpr size_t kStepsAtOnce = 64;  // files and folders between two checks for a stop
 
 void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
@@ -105,9 +103,10 @@ bool is_audio(const std::string &path, const options &opts, failure &refusal) {
     if (kind != file_kind::unknown) return true;
     if (!opts.ffmpeg.empty() && has_media_suffix(path)) return true;
     // The library also finds MPEG audio after other bytes.
-    short_path opened = open_short_path(path);
-    const int32_t probed = tavo_probe(opened.path.c_str(), nullptr);
-    close_short_path(opened);
+    song_file song;
+    if (open_song(path, -1, song)) return false;
+    const int32_t probed = tavo_probe(song.path.c_str(), nullptr);
+    close_song(song);
     return probed != TAVO_ERR_FORMAT && probed != TAVO_ERR_READ;
 }
 
@@ -167,36 +166,24 @@ bool look_at_argument(input_supply &supply, input &out) {
     return static_cast<bool>(out.refusal);
 }
 
-bool look_at_next(input_supply &supply, input &out) {
-    if (!supply.folder.empty()) return look_at_entry(supply, out);
-    if (supply.list.fd >= 0) return look_at_list(supply, out);
-    return look_at_argument(supply, out);
-}
-
-bool is_done(const input_supply &supply) {
-    return supply.folder.empty() && supply.list.fd < 0 &&
-           supply.argument == supply.opts.inputs.size() + supply.opts.lists.size();
-}
-
 }  // namespace
 
 supply_state next_input(input_supply &supply, input &out) {
-    for (size_t steps = 0; !is_done(supply); ++steps) {
-        if (steps == kStepsAtOnce) return supply_state::searching;
-        const bool is_list = supply.folder.empty() && supply.list.fd >= 0;
-        if (look_at_next(supply, out)) {
-            if (out.refusal || claim_targets(supply, out)) return supply_state::ready;
-        } else if (is_list && supply.folder.empty() && supply.list.fd >= 0) {
-            return supply_state::waiting;  // for a name
+    const options &opts = supply.opts;
+    const bool is_search = !supply.folder.empty();
+    const bool is_list = !is_search && supply.list.fd >= 0;
+    if (!is_search && !is_list && supply.argument == opts.inputs.size() + opts.lists.size()) {
+        if (supply.existing > 0) {
+            add_note(supply,
+                     count_text(supply.existing, "input") + " left out: the file is there.");
+            supply.existing = 0;
         }
+        return supply_state::ended;
     }
-    if (supply.existing > 0) {
-        add_note(supply, count_text(supply.existing, "input") + " left out: the file is there.");
-        supply.existing = 0;
-    }
-    return supply_state::ended;
-}
-
-int supply_fd(const input_supply &supply) {
-    return supply.list.fd;
+    const bool is_found = is_search ? look_at_entry(supply, out)
+                          : is_list ? look_at_list(supply, out)
+                                    : look_at_argument(supply, out);
+    if (is_found && (out.refusal || claim_targets(supply, out))) return supply_state::ready;
+    const bool is_waiting = is_list && !is_found && supply.folder.empty() && supply.list.fd >= 0;
+    return is_waiting ? supply_state::waiting : supply_state::searching;
 }

@@ -39,8 +39,8 @@ struct input_supply {
 
 enum class supply_state {
     ready,
-    searching,  // many files examined, none of them audio: call again
-    waiting,    // for a list; supply_fd becomes readable when more has arrived
+    searching,  // one name was examined, and it is not an input: call again
+    waiting,    // for a list, whose descriptor becomes readable when more has arrived
     ended,
 };
 
@@ -53,7 +53,5 @@ enum class supply_state {
 // the same one. Memory grows with the folders of a search and the marker files, but not with a
 // list.
 supply_state next_input(input_supply &supply, input &out);
-
-int supply_fd(const input_supply &supply);
 
 #endif

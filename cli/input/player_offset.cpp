@@ -5,7 +5,6 @@
 #include <cstdio>
 #include <filesystem>
 
-#include "cli/input/file_bytes.h"
 #include "cli/input/recognise.h"
 
 namespace {

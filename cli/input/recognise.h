@@ -1,8 +1,12 @@
 // Recognises audio by the first bytes of a file, whatever its name, and names the format for
 // messages. The library decides whether the file can be analysed.
+//
+// Input: a path or bytes. Output: a file_kind. Used by inputs.h, list_reader.h, explain.h and
+// report/report.h; player_offset.h also uses the functions that read bytes.
 #ifndef TAVO_CLI_INPUT_RECOGNISE_H
 #define TAVO_CLI_INPUT_RECOGNISE_H
 
+#include <cstdint>
 #include <string>
 #include <string_view>
 
@@ -21,14 +25,26 @@ enum class file_kind {
 
 constexpr size_t kKindBytes = 16;  // needed by recognise_bytes
 
-// head: the first bytes of a file, or of what follows its ID3v2 tag.
+// Recognises the first bytes of a file, or those that follow its ID3v2 tags.
 file_kind recognise_bytes(std::string_view head);
 
-// Returns 0, or errno if the file cannot be opened or read. Anything but a regular file is unknown.
-// Never blocks.
+// Returns 0, or errno if the file cannot be opened or read. Any file that is not a regular file is
+// unknown. Never blocks.
 int recognise(const std::string &path, file_kind &kind);
 
-// Returns the format's name for people.
+// Returns the format's name for messages.
 const char *kind_name(file_kind kind);
+
+// Returns up to `size` bytes of a regular file, starting at `offset`: fewer at the end of the file
+// or after an error. `code` receives the errno of the error, or 0. Any other kind of file counts as
+// empty. Never blocks.
+std::string read_bytes(const std::string &path, int64_t offset, int64_t size, int &code);
+
+// Returns the big-endian number of `size` bytes at `offset`, or 0 if it extends past the end.
+uint64_t big_endian(std::string_view bytes, size_t offset, size_t size);
+
+// Returns the offset of the first byte after the ID3v2 tags at the start of the file; 0 if the file
+// has no such tag.
+int64_t find_id3v2_end(const std::string &path, int &code);
 
 #endif

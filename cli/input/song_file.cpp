@@ -11,10 +11,8 @@
 #include <charconv>
 #include <string_view>
 
-#include "cli/input/explain.h"
 #include "cli/input/ffmpeg.h"
 #include "cli/input/recognise.h"
-#include "cli/input/short_path.h"
 #include "cli/system.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
@@ -60,12 +58,17 @@ int copy_pipe(int source, int target, int stop_fd) {
     return EFBIG;
 }
 
+// Returns a song that is read through a descriptor.
+song_file song_at(int fd, int source_fd, bool by_ffmpeg) {
+    return {"/proc/self/fd/" + std::to_string(fd), fd, source_fd, by_ffmpeg};
+}
+
 failure read_inherited_pipe(int pipe_fd, int stop_fd, song_file &song) {
     int fd = memfd_create("song", MFD_CLOEXEC);
     const int code = fd < 0 ? errno : copy_pipe(pipe_fd, fd, stop_fd);
     const off_t size = lseek(fd, 0, SEEK_CUR);
     if (code == 0 && size >= TAVO_MIN_FILE_BYTES) {
-        song = {"/proc/self/fd/" + std::to_string(fd), fd, fd, false};
+        song = song_at(fd, fd, false);
         return {};
     }
     close_fd(fd);
@@ -74,21 +77,35 @@ failure read_inherited_pipe(int pipe_fd, int stop_fd, song_file &song) {
     return {"Only " + std::to_string(size) + " bytes came through the pipe."};
 }
 
+// Checks that the file is a readable regular file of sufficient size. Never blocks.
+failure check_file(const std::string &path) {
+    struct stat info {};
+    if (stat(path.c_str(), &info) != 0) {
+        if (errno == ENOENT) return {"The file does not exist."};
+        return {system_sentence("The file cannot be opened", errno)};
+    }
+    if (S_ISDIR(info.st_mode)) return {"This is a folder, not a file."};
+    if (!S_ISREG(info.st_mode)) return {"This is a device, pipe or socket, not a file."};
+    int code = 0;
+    const size_t size = read_bytes(path, 0, TAVO_MIN_FILE_BYTES, code).size();
+    if (code != 0) return {system_sentence("The file cannot be read", code)};
+    if (size == 0) return {"The file is empty."};
+    if (size == TAVO_MIN_FILE_BYTES) return {};
+    return {"The file is too short to be audio: it has " + std::to_string(size) + " bytes."};
+}
+
 }  // namespace
 
 failure open_song(const std::string &path, int stop_fd, song_file &song) {
     const int inherited = named_descriptor(path);
     if (is_inherited_pipe(inherited)) return read_inherited_pipe(inherited, stop_fd, song);
     if (failure failed = check_file(path)) return failed;
-    const short_path opened = open_short_path(path);
-    song = {opened.path, opened.fd, opened.fd, false};
+    song = {path == "fd" ? "./fd" : path};  // the library takes "fd" for a descriptor
+    if (path.size() < TAVO_PATH_BYTES) return {};
+    const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
+    if (fd < 0) return {system_sentence("The file cannot be opened", errno)};
+    song = song_at(fd, fd, false);
     return {};
-}
-
-bool needs_ffmpeg(const song_file &song) {
-    const int32_t code = song.by_ffmpeg ? TAVO_OK : tavo_probe(song.path.c_str(), nullptr);
-    return code == TAVO_ERR_FORMAT || code == TAVO_ERR_OPEN || code == TAVO_ERR_CODEC ||
-           code == TAVO_ERR_LOW_RATE;
 }
 
 failure decode_song(const std::string &path, const options &opts, int stop_fd, song_file &song) {
@@ -97,9 +114,8 @@ failure decode_song(const std::string &path, const options &opts, int stop_fd, s
     }
     int sound_fd = -1;
     const failure failed = decode_with_ffmpeg(opts, path, song.fd, "", stop_fd, sound_fd);
-    if (failed) return failed;
-    song = {"/proc/self/fd/" + std::to_string(sound_fd), sound_fd, song.fd, true};
-    return {};
+    if (!failed) song = song_at(sound_fd, song.fd, true);
+    return failed;
 }
 
 failure raise_song(const std::string &path, const options &opts, int stop_fd, const song_file &song,
@@ -114,9 +130,8 @@ failure raise_song(const std::string &path, const options &opts, int stop_fd, co
     if (offset_ms < 0.0) filter += ",atrim=start=" + std::to_string(-offset_ms / 1000.0);
     int fd = song.by_ffmpeg ? song.source_fd : song.fd;
     const failure failed = decode_with_ffmpeg(opts, path, fd, filter, stop_fd, fd);
-    if (failed) return failed;
-    raised = {"/proc/self/fd/" + std::to_string(fd), fd, -1, true};
-    return {};
+    if (!failed) raised = song_at(fd, -1, true);
+    return failed;
 }
 
 void close_song(song_file &song) {

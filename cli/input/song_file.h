@@ -21,10 +21,6 @@ struct song_file {
 // any other file. After a failure there is nothing to close.
 failure open_song(const std::string &path, int stop_fd, song_file &song);
 
-// True if the library refuses the song because of its format, coding or sample rate, so that ffmpeg
-// may be able to decode it.
-bool needs_ffmpeg(const song_file &song);
-
 // Replaces the song by the output of ffmpeg. After a failure, or without ffmpeg, the song is
 // unchanged.
 failure decode_song(const std::string &path, const options &opts, int stop_fd, song_file &song);

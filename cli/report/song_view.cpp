@@ -7,7 +7,6 @@
 #include <memory>
 #include <numeric>
 
-#include "cli/input/short_path.h"
 #include "cli/system.h"
 #include "cli/write/file_names.h"
 #include "cli/write/markers.h"
@@ -171,11 +170,9 @@ failure read_song_view(const record &result, int stop_fd, result_json &view) {
     const int32_t rate = result.sample_rate;
     const int64_t samples_per_hop = int64_t{rate} * TAVO_LOUDNESS_HOP_MS / 1000;
     sound song;
-    short_path opened =
-        open_short_path(result.sound_path.empty() ? result.file : result.sound_path);
-    const failure failed = read_samples(opened.path, samples_per_hop, stop_fd, song);
-    close_short_path(opened);
-    if (failed) return failed;
+    if (failure failed = read_samples(result.sound_path, samples_per_hop, stop_fd, song)) {
+        return failed;
+    }
 
     const double read_ms = 1000.0 * static_cast<double>(song.samples) / rate;
     double length_ms = std::max(read_ms, static_cast<double>(result.hl_pos_ms));

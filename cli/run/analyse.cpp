@@ -19,6 +19,8 @@
 
 namespace {
 
+constexpr int64_t kMsPerMinute = 60'000;
+
 // Mean square that --normalize gives the loudest 6 s, full scale 1: -8 dBFS. At this level the
 // library refines the highlight after any rise of 3 dB.
 constexpr double kRaisedPower = 0.1585;
@@ -44,11 +46,6 @@ const TAVO_INFO *wait_for_result(const job_end &end, int stop_fd) {
     return end.result.load(std::memory_order_acquire);
 }
 
-void read_stream(const TAVO_CTX *ctx, record &out) {
-    tavo_get_stream(ctx, &out.sample_rate, &out.channels, &out.duration_ms);
-    out.has_stream = true;
-}
-
 // Mean square of the loudest window, full scale 1; 0 in mode beats.
 double loudest_passage(const TAVO_CTX *ctx) {
     int32_t count = 0;
@@ -58,13 +55,9 @@ double loudest_passage(const TAVO_CTX *ctx) {
 }
 
 // Must be called after the callback, when the job no longer changes the instance.
-void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
-    if (tavo_has_audio(ctx) == 0) {
-        out.error = "No audio could be decoded from the file.";
-        return;
-    }
-    if (tavo_is_complete(ctx) == 0) {
-        out.error = "The file could not be read to its end.";
+void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, const song_file &song, record &out) {
+    if (tavo_has_audio(ctx) == 0 || tavo_is_complete(ctx) == 0) {
+        out.error = explain_lost_audio(song.path, tavo_has_audio(ctx) != 0);
         return;
     }
     out.has_highlight = out.mode != TAVO_MODE_BEATS;
@@ -84,31 +77,21 @@ void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, record &out) {
 }
 
 // Runs the job of an instance and releases it.
-void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, record &out) {
-    read_stream(ctx, out);
-    if (const failure too_long = check_duration(out.duration_ms, opts.max_minutes)) {
-        out.error = too_long.sentence;
-        tavo_deinit(ctx);
-        return;
-    }
+void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, const song_file &song, record &out) {
     job_end end;
     end.fd = eventfd(0, EFD_CLOEXEC);
+    tavo_set_listener(ctx, on_result, &end);
     if (end.fd < 0) {
         out.error = system_sentence("The analysis could not be started", errno);
-        tavo_deinit(ctx);
-        return;
-    }
-    tavo_set_listener(ctx, on_result, &end);
-    const int32_t code = tavo_analyze(ctx, opts.length_s, opts.max_beats, 0);
-    if (code != TAVO_OK) {
-        out.error = "The analysis could not be started (code " + std::to_string(code) + ").";
+    } else if (const int32_t code = tavo_analyze(ctx, opts.length_s, opts.max_beats, 0)) {
+        out.error =
+            std::string("The analysis could not be started: ") + tavo_error_text(code) + ".";
     } else if (const TAVO_INFO *info = wait_for_result(end, stop_fd)) {
-        read_result(ctx, info, out);
+        read_result(ctx, info, song, out);
     } else {
-        out.status = outcome::stopped;
         out.error = "The analysis was stopped.";
     }
-    tavo_deinit(ctx);
+    tavo_deinit(ctx);  // after a stop it waits for the callback, which uses `end`
     close_fd(end.fd);
 }
 
@@ -134,7 +117,7 @@ void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record
         if (!failed) failed = {found.error};
     }
     if (failed) {
-        out.status = is_readable(stop_fd) ? outcome::stopped : outcome::failed;
+        out.status = outcome::failed;
         out.error = "The song could not be raised in level. " + failed.sentence;
         return;
     }
@@ -144,29 +127,46 @@ void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record
     beats.erase(beats.begin(), std::lower_bound(beats.begin(), beats.end(), out.hl_pos_ms));
 }
 
+// Explains why the library refused the song, or decodes it with ffmpeg and analyses the output.
+void analyse_refused(const options &opts, int stop_fd, int32_t code, song_file &song, record &out) {
+    TAVO_STREAM stream{};
+    if (code != TAVO_ERR_MEMORY) code = tavo_probe(song.path.c_str(), &stream);
+    const bool may_decode = code == TAVO_ERR_FORMAT || code == TAVO_ERR_OPEN ||
+                            code == TAVO_ERR_CODEC || code == TAVO_ERR_LOW_RATE;
+    failure failed;
+    if (may_decode && !song.by_ffmpeg) {
+        failed = decode_song(out.file, opts, stop_fd, song);
+        if (!failed) {
+            out.decoder = "ffmpeg";
+            return analyse_opened(opts, stop_fd, song, out);
+        }
+    }
+    out.has_stream = stream.rate > 0;
+    out.sample_rate = stream.rate;
+    out.channels = stream.channels;
+    out.duration_ms = stream.duration_ms;
+    out.error = explain_refusal(song.path, code, stream);
+    if (failed) out.error += " " + failed.sentence;
+}
+
 void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out) {
     const TAVO_PARAM param = {song.path.c_str(), opts.mode};
     int32_t code = TAVO_OK;
     TAVO_CTX *ctx = tavo_init(&param, &code);
-    if (ctx != nullptr) {
-        run_job(ctx, opts, stop_fd, out);
-        out.offset_ms = find_player_offset_ms(song.path, out.sample_rate, out.channels);
-        const bool has_result = out.status == outcome::ok && out.has_highlight;
-        if (opts.normalize && has_result) refine_quiet_song(opts, stop_fd, song, out);
+    if (ctx == nullptr) return analyse_refused(opts, stop_fd, code, song, out);
+    tavo_get_stream(ctx, &out.sample_rate, &out.channels, &out.duration_ms);
+    out.has_stream = true;
+    out.offset_ms = find_player_offset_ms(song.path, out.sample_rate, out.channels);
+    if (out.duration_ms > opts.max_minutes * kMsPerMinute) {
+        out.error = "The audio lasts " + whole_clock_text(static_cast<double>(out.duration_ms)) +
+                    ", as the file states; the limit is --max-minutes " +
+                    std::to_string(opts.max_minutes) + ".";
+        tavo_deinit(ctx);
         return;
     }
-    failure failed;
-    if (needs_ffmpeg(song)) {
-        failed = decode_song(out.file, opts, stop_fd, song);
-        if (!failed) {
-            out.decoder = "ffmpeg";
-            out.sound_path = song.path;
-            return analyse_opened(opts, stop_fd, song, out);
-        }
-    }
-    out.error = explain_refusal(song.path, code, out).sentence;
-    if (failed) out.error += " " + failed.sentence;
-    if (is_readable(stop_fd)) out.status = outcome::stopped;
+    run_job(ctx, opts, stop_fd, song, out);
+    const bool has_result = out.status == outcome::ok && out.has_highlight;
+    if (opts.normalize && has_result) refine_quiet_song(opts, stop_fd, song, out);
 }
 
 // Processor time of this process and its ffmpeg processes, all threads, user and system.
@@ -186,18 +186,13 @@ int64_t cpu_time_ms() {
 
 record analyse(const std::string &path, const options &opts, int stop_fd, song_file &song) {
     record out = failed_record(path, opts.mode, open_song(path, stop_fd, song).sentence);
-    out.length_s = opts.length_s;
-    if (!out.error.empty()) {
-        if (is_readable(stop_fd)) out.status = outcome::stopped;
-        return out;
-    }
-
     output_file click;
-    out.error = begin_click(click, opts, path).sentence;
+    if (out.error.empty()) out.error = begin_click(click, opts, path).sentence;
     if (!out.error.empty()) return out;
 
     const int64_t before_ms = cpu_time_ms();
     analyse_opened(opts, stop_fd, song, out);
+    out.sound_path = song.path;
     out.cpu_ms = cpu_time_ms() - before_ms;
     if (failure failed = finish_click(click, opts, out.status == outcome::ok)) {
         out.status = outcome::failed;

@@ -86,8 +86,8 @@ void search_inputs(run_state &state) {
         job next;
         state.found = find_next(state, next);
         if (state.found == supply_state::ended) state.output.total = state.count;
-        if (state.found != supply_state::ready) break;
-        if (!is_wanted(state, next)) continue;
+        if (state.found == supply_state::waiting) break;
+        if (state.found != supply_state::ready || !is_wanted(state, next)) continue;
         next.message.index = state.count++;
         state.queue.push_back(std::move(next));
     }
@@ -132,7 +132,7 @@ void wait_and_serve(run_state &state) {
     std::vector<pollfd> watched = {
         {state.is_ending ? -1 : stop_fd(), POLLIN, 0},
         {state.output.to_pipe && !state.is_ending ? STDOUT_FILENO : -1, 0, 0},
-        {is_listening ? supply_fd(state.supply) : -1, POLLIN, 0}};
+        {is_listening ? state.supply.list.fd : -1, POLLIN, 0}};
     const size_t first_worker = watched.size();
     append_watched(state.pool, watched);
     if (poll(watched.data(), watched.size(), is_searching ? 0 : wait_ms(state)) >= 0) {
@@ -146,7 +146,7 @@ void wait_and_serve(run_state &state) {
 // Ends the workers at a stop or if no work is left.
 void end_if_done(run_state &state) {
     if (state.is_ending) return;
-    const bool is_stop = stop_requested() || output_failed(state.output) || state.db.has_failed;
+    const bool is_stop = stop_signal() != 0 || output_failed(state.output) || state.db.has_failed;
     const bool is_exhausted = state.found == supply_state::ended && state.queue.empty();
     if (!is_stop && (!is_exhausted || has_busy(state.pool))) return;
     state.is_ending = true;

@@ -21,11 +21,13 @@ struct reply {
     std::string row;      // of the report's index, or empty
 };
 
-std::string encode(const request &message);
-std::string encode(const reply &message);
+// Encodes a request or a reply.
+template <typename record_type>
+std::string encode(const record_type &message);
 
-// Decodes the message at the start of received and removes it. False if it is not complete yet.
-bool decode(std::string &received, request &message);
-bool decode(std::string &received, reply &message);
+// Decodes the message at the start of `received` and removes it. Returns false if it is not
+// complete yet.
+template <typename record_type>
+bool decode(std::string &received, record_type &message);
 
 #endif

@@ -25,7 +25,7 @@ constexpr milliseconds kStopPatience{1000};
 
 // Runs in the new process. It closes the sockets of the other workers, because a copy left open
 // would hide the end of the command from them.
-[[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_files *files, int fd) {
+[[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_files &files, int fd) {
     for (worker_process &other : pool.processes) close_fd(other.fd);
     ignore_stop_signals();
     prctl(PR_SET_PDEATHSIG, remove_files_at_signal(files));
@@ -43,14 +43,13 @@ failure start_process(process_pool &pool) {
     }
     if (worker.pid == 0) {
         close(ends[0]);
-        become_worker(pool, command, worker.files, ends[1]);
+        become_worker(pool, command, *worker.files, ends[1]);
     }
     const int code = errno;
     worker.fd = ends[0];
     close_fd(ends[1]);
     if (worker.pid < 0) {
         close_fd(worker.fd);
-        release_temporary_files(worker.files);
         return {system_sentence("The analysis process could not be started", code)};
     }
     pool.processes.push_back(std::move(worker));
@@ -84,8 +83,7 @@ void reap(process_pool &pool, worker_process &worker) {
     while (waitpid(worker.pid, &status, 0) < 0 && errno == EINTR) {
     }
     worker.pid = -1;
-    remove_files(worker.files);
-    release_temporary_files(worker.files);
+    remove_files(*worker.files);
     if (worker.is_busy) {
         finish_job(pool, worker, make_reply(unfinished_record(pool, worker, status), pool.opts));
     } else if (status != 0 && !pool.is_stopping) {

@@ -13,6 +13,7 @@
 
 #include <chrono>
 #include <functional>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -38,7 +39,7 @@ struct worker_process {
     job current;                              // while busy
     std::string received;                     // start of a reply
     time_point deadline = time_point::max();  // time at which the worker is killed
-    temporary_files *files = nullptr;         // shared with the worker
+    std::shared_ptr<temporary_files> files;
 };
 
 struct process_pool {

@@ -7,6 +7,7 @@
 #include <csignal>
 
 #include "cli/options.h"
+#include "cli/system.h"
 
 namespace {
 
@@ -23,16 +24,6 @@ void on_signal(int number) {
     errno = saved;
 }
 
-// Returns the previous handler.
-sighandler_t set_handler(int number, sighandler_t handler) {
-    struct sigaction action {};
-    struct sigaction before {};
-    action.sa_handler = handler;
-    sigemptyset(&action.sa_mask);
-    sigaction(number, &action, &before);  // no SA_RESTART: a blocked read must return
-    return before.sa_handler;
-}
-
 }  // namespace
 
 bool watch_for_stop() {
@@ -40,21 +31,17 @@ bool watch_for_stop() {
     if (wake_fd < 0) return false;
     for (const int number : kSignals) {
         // A command started by nohup continues after a SIGHUP.
-        const bool was_ignored = set_handler(number, on_signal) == SIG_IGN;
-        if (was_ignored && number == SIGHUP) set_handler(number, SIG_IGN);
+        const bool was_ignored = set_signal_handler(number, on_signal) == SIG_IGN;
+        if (was_ignored && number == SIGHUP) set_signal_handler(SIGHUP, SIG_IGN);
     }
-    set_handler(SIGPIPE, SIG_IGN);
-    set_handler(SIGXFSZ, SIG_IGN);  // writing beyond the size limit returns an error
+    set_signal_handler(SIGPIPE, SIG_IGN);
+    set_signal_handler(SIGXFSZ, SIG_IGN);  // writing beyond the size limit returns an error
     return true;
 }
 
 void ignore_stop_signals() {
-    for (const int number : kSignals) set_handler(number, SIG_IGN);
+    for (const int number : kSignals) set_signal_handler(number, SIG_IGN);
     close(wake_fd);
-}
-
-bool stop_requested() {
-    return received != 0;
 }
 
 int stop_signal() {

@@ -10,8 +10,7 @@ bool watch_for_stop();
 // Ignores these signals in a worker process, which ends when its socket is closed.
 void ignore_stop_signals();
 
-bool stop_requested();
-int stop_signal();  // number of the signal, or 0
+int stop_signal();  // number of the first signal, or 0
 int stop_fd();      // becomes readable after the first signal
 
 #endif

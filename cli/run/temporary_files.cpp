@@ -7,34 +7,30 @@
 #include <cstring>
 
 #include "cli/options.h"
+#include "cli/system.h"
 
 namespace {
 
 temporary_files *own_files = nullptr;
 
 void on_signal(int /*number*/) {
-    remove_files(own_files);
+    remove_files(*own_files);
     _exit(kExitFailed);
 }
 
 }  // namespace
 
-temporary_files *make_temporary_files() {
+std::shared_ptr<temporary_files> make_temporary_files() {
     void *memory = mmap(nullptr, sizeof(temporary_files), PROT_READ | PROT_WRITE,
                         MAP_SHARED | MAP_ANONYMOUS, -1, 0);
-    return memory == MAP_FAILED ? nullptr : static_cast<temporary_files *>(memory);
+    if (memory == MAP_FAILED) return nullptr;
+    return {static_cast<temporary_files *>(memory),
+            [](temporary_files *files) { munmap(files, sizeof *files); }};
 }
 
-void release_temporary_files(temporary_files *files) {
-    if (files != nullptr) munmap(files, sizeof *files);
-}
-
-int remove_files_at_signal(temporary_files *files) {
-    own_files = files;
-    struct sigaction action {};
-    action.sa_handler = on_signal;
-    sigemptyset(&action.sa_mask);
-    sigaction(SIGALRM, &action, nullptr);
+int remove_files_at_signal(temporary_files &files) {
+    own_files = &files;
+    set_signal_handler(SIGALRM, on_signal);
     return SIGALRM;
 }
 
@@ -56,8 +52,8 @@ void forget_temporary_file(const std::string &path) {
     }
 }
 
-void remove_files(temporary_files *files) {
-    for (auto &slot : files->paths) {
+void remove_files(temporary_files &files) {
+    for (auto &slot : files.paths) {
         if (slot[0] != '\0') unlink(slot);
         slot[0] = '\0';
     }

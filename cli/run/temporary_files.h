@@ -4,6 +4,7 @@
 #define TAVO_CLI_RUN_TEMPORARY_FILES_H
 
 #include <climits>
+#include <memory>
 #include <string>
 
 struct temporary_files {
@@ -11,18 +12,17 @@ struct temporary_files {
 };
 
 // Returns null if memory runs out.
-temporary_files *make_temporary_files();
-void release_temporary_files(temporary_files *files);  // accepts null
+std::shared_ptr<temporary_files> make_temporary_files();
 
-// Called in a worker. From then on a signal, whose number is returned, removes the files and ends
-// the worker, and the two functions below add and remove names.
-int remove_files_at_signal(temporary_files *files);
+// Called in a worker. From then on, a signal removes the files and ends the worker, and the next
+// two functions have an effect. Returns the number of the signal.
+int remove_files_at_signal(temporary_files &files);
 
-// Adds (removes) the name of a file of this worker. Does nothing in the command itself.
+// Adds or removes the name of a file of this worker. Does nothing in the command itself.
 void note_temporary_file(const std::string &path);
 void forget_temporary_file(const std::string &path);
 
 // Removes the listed files. Safe in a signal handler.
-void remove_files(temporary_files *files);
+void remove_files(temporary_files &files);
 
 #endif

@@ -30,9 +30,8 @@ constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappi
 constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
 constexpr int kFreeMemoryKept = 64 << 20;
 
-// Returns the stored result, or analyses the file.
-record find_result(const request &message, const options &opts, int stop_fd, song_file &song) {
-    if (message.stored.empty()) return analyse(message.path, opts, stop_fd, song);
+// Returns a result of the store. Opens the song if its page is requested.
+record read_stored(const request &message, const options &opts, int stop_fd, song_file &song) {
     record out;
     try {
         out = record_from_json(message.stored);
@@ -41,11 +40,12 @@ record find_result(const request &message, const options &opts, int stop_fd, son
         out.error = "Its row in the store is damaged.";
     }
     out.file = message.path;
-    out.length_s = opts.length_s;
-    const bool is_decoded = !out.decoder.empty() && !opts.report.empty() &&
-                            !open_song(message.path, stop_fd, song) &&
-                            !decode_song(message.path, opts, stop_fd, song);
-    if (is_decoded) out.sound_path = song.path;
+    if (!opts.report.empty() && !open_song(message.path, stop_fd, song)) {
+        const bool needs_ffmpeg = !out.decoder.empty();
+        if (!needs_ffmpeg || !decode_song(message.path, opts, stop_fd, song)) {
+            out.sound_path = song.path;
+        }
+    }
     return out;
 }
 
@@ -77,55 +77,66 @@ struct side_files {
     std::string clip;
 };
 
-side_files find_side_files(const request &message, const options &opts) {
-    side_files out;
-    if (!opts.report.empty()) out.page = report_page_path(opts, message.index, message.path);
-    if (opts.markers != nullptr) out.markers = marker_path(message.path, opts);
-    if (!opts.clip.empty()) out.clip = clip_path(message.path, opts);
-    return out;
-}
-
-// Checks, before the analysis, that the files can be written.
-failure check_side_files(const side_files &files, const options &opts) {
+// Names the files, and checks before the analysis that they can be written.
+failure find_side_files(const request &message, const options &opts, side_files &files) {
     failure failed;
-    if (!files.page.empty()) failed = check_report(files.page, opts.force);
-    // With a store an existing file may be this song's, so write_markers compares it.
-    const bool may_exist = opts.force || is_stored(opts);
-    if (!failed && !files.markers.empty()) failed = check_target(files.markers, may_exist);
-    if (!failed && !files.clip.empty()) failed = check_target(files.clip, opts.force);
+    if (!opts.report.empty()) {
+        files.page = report_page_path(opts, message.index, message.path);
+        failed = check_report(files.page, opts.force);
+    }
+    if (!failed && opts.markers != nullptr) {
+        files.markers = marker_path(message.path, opts);
+        // With a store an existing file may be this song's, so write_markers compares it.
+        failed = check_target(files.markers, opts.force || is_stored(opts));
+    }
+    if (!failed && !opts.clip.empty()) {
+        files.clip = clip_path(message.path, opts);
+        failed = check_target(files.clip, opts.force);
+    }
     return failed;
 }
 
-reply analyse_and_write(const request &message, const options &opts, int stop_fd) {
-    const side_files files = find_side_files(message, opts);
-    const failure refused = check_side_files(files, opts);
-    if (refused) {
-        reply out = make_reply(failed_record(message.path, opts.mode, refused.sentence), opts);
-        out.json.clear();
-        return out;
+failure write_side_files(record &result, const options &opts, const side_files &files, int stop_fd,
+                         const song_file &song, std::string &row) {
+    failure failed;
+    if (!files.page.empty()) failed = write_report_page(result, opts, files.page, stop_fd, row);
+    if (!failed && !files.markers.empty()) failed = write_markers(result, opts, files.markers);
+    if (!failed && !files.clip.empty()) {
+        failed = write_clip(result, opts, files.clip, stop_fd, song);
     }
+    return failed;
+}
+
+// Returns the reply for a failure that says nothing about the song. The store does not record it.
+reply make_failed_reply(const request &message, const options &opts, int stop_fd,
+                        const std::string &error) {
+    record result = failed_record(message.path, opts.mode, error);
+    if (is_readable(stop_fd)) result.status = outcome::stopped;
+    reply out = make_reply(result, opts);
+    out.json.clear();
+    return out;
+}
+
+reply analyse_and_write(const request &message, const options &opts, int stop_fd) {
+    side_files files;
     song_file song;
     std::string row;
-    record result = find_result(message, opts, stop_fd, song);
-    failure failed;
+    record result;
+    failure failed = find_side_files(message, opts, files);
+    if (!failed) {
+        result = message.stored.empty() ? analyse(message.path, opts, stop_fd, song)
+                                        : read_stored(message, opts, stop_fd, song);
+        result.length_s = opts.length_s;
+    }
     if (result.status == outcome::ok) {
-        if (!files.page.empty()) {
-            failed = write_report_page(result, opts, files.page, stop_fd, row);
-        }
-        if (!failed && !files.markers.empty()) failed = write_markers(result, opts, files.markers);
-        if (!failed && !files.clip.empty()) {
-            failed = write_clip(result, opts, files.clip, stop_fd, song);
-        }
+        failed = write_side_files(result, opts, files, stop_fd, song, row);
+    } else if (is_readable(stop_fd)) {
+        result.status = outcome::stopped;
     }
     close_song(song);
-    if (failed) {
-        result = failed_record(message.path, opts.mode, failed.sentence);
-        if (is_readable(stop_fd)) result.status = outcome::stopped;
-    }
+    if (failed) return make_failed_reply(message, opts, stop_fd, failed.sentence);
     reply out = make_reply(result, opts);
-    if (result.status == outcome::ok) out.row = row;
-    // The store does not record a failure to write a file.
-    if (failed) out.json.clear();
+    if (!row.empty()) out.row = row;
     return out;
 }
 
@@ -134,9 +145,7 @@ std::string serve(const request &message, const options &opts, int stop_fd) {
         return encode(analyse_and_write(message, opts, stop_fd));
     } catch (const std::exception &) {  // only allocations can fail here
         const char *error = "There is not enough memory for the result.";
-        reply out = make_reply(failed_record(message.path, opts.mode, error), opts);
-        out.json.clear();
-        return encode(out);
+        return encode(make_failed_reply(message, opts, stop_fd, error));
     }
 }
 
