@@ -3,6 +3,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "common/alloc.h"
+
 namespace {
 
 constexpr int32_t kBytesPerSample = 2;
@@ -114,6 +116,11 @@ int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pc
     }
     free(frame_buf);
     return code;
+}
+
+void pcm_queue_release_pages(const mtsrc_ctx *src) {
+    release_pages(src->q_base, src->q_rd);
+    release_pages(src->q_wr, src->q_base + src->q_cap);
 }
 
 int32_t pcm_first_channel(uint8_t *dst, const uint8_t *pcm, int32_t bytes, int32_t channels) {

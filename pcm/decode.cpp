@@ -1,6 +1,7 @@
 #include "pcm/decode.h"
 
 #include "common/worker_group.h"
+#include "media_source/pcm_queue.h"
 #include "pcm/read_pcm.h"
 
 namespace {
@@ -38,6 +39,10 @@ int64_t decode_segments(TAVO_CTX *ctx, void *dst, int64_t dst_capacity, segment_
         slots[i] = {seg, &seg->thread, _tavo_mtproc_decoding, decode_segment};
     }
     worker_group_run(slots, count, ext_mutex_mt, ext_cond_mt, ctx->seg[0].done);
+    for (int32_t i = 0; i < count && pages == segment_pages::released; ++i) {
+        const TAVO_DECSEG *seg = &ctx->seg[i];
+        if (seg->src != nullptr && seg->cap >= kLargeBytes) pcm_queue_release_pages(seg->src);
+    }
     return stitch_segments(ctx->seg, count, ctx->fmt.sample_rate, static_cast<uint8_t *>(dst),
                            dst_capacity, pages);
 }

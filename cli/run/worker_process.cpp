@@ -25,7 +25,7 @@
 namespace {
 
 // Bytes.
-constexpr int kHeapAtStart = 28 << 20;       // the buffers of a song of three minutes
+constexpr int kHeapAtStart = 16 << 20;       // the buffers of a short song
 constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappings
 constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
 constexpr int kFreeMemoryKept = 64 << 20;
