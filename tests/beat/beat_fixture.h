@@ -1,10 +1,14 @@
-// Sets up a beat analysis of a given signal, and generates test signals.
+// Sets up a beat analysis of a given signal and generates test signals.
 #ifndef TAVO_TESTS_BEAT_BEAT_FIXTURE_H
 #define TAVO_TESTS_BEAT_BEAT_FIXTURE_H
 
+#include <gtest/gtest.h>
+
+#include <algorithm>
 #include <cmath>
 #include <cstdlib>
 #include <random>
+#include <tuple>
 #include <vector>
 
 #include "beat/beat_ctx.h"
@@ -13,7 +17,7 @@
 
 constexpr double kHop = 256.0 / 11025.0;  // seconds
 
-// An instance with an analysis signal, in state 2 as inside a job. It writes no click track.
+// An instance with an analysis signal, as it is while a job runs. It writes no click track.
 struct analysis {
     TAVO_CTX ctx = {};
     std::vector<double> ana;
@@ -34,7 +38,7 @@ struct analysis {
     ~analysis() { clearOnsetCtx(ctx.onset); }
 };
 
-// The context of a silent signal of a given number of analysis frames, with lock and condition.
+// An initialised beat context for a silent signal of `frames` analysis frames.
 struct working_context {
     analysis signal;
     TAVO_BEAT_CTX beat = {};
@@ -50,8 +54,8 @@ inline double uniform(std::mt19937 *random) {
     return static_cast<double>((*random)()) / 2147483648.0 - 1.0;
 }
 
-// Random samples of one of five kinds: from -1 to 1; of any size up to 2^highest; mostly zeros;
-// denormal numbers; zeros of both signs.
+// Returns random samples of one of five kinds: values from -1 to 1, values of any magnitude up to
+// 2^highest, mostly zeros, denormal numbers, or zeros of both signs.
 inline std::vector<double> extreme_samples(size_t n, int highest, std::mt19937 *random) {
     std::vector<double> samples(n);
     const auto kind = (*random)() % 5;

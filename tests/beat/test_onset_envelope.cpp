@@ -1,6 +1,3 @@
-#include <gtest/gtest.h>
-
-#include <algorithm>
 #include <cstring>
 
 #include "beat/onset_envelope.h"
@@ -10,7 +7,7 @@
 
 namespace {
 
-// True if bit-identical or both NaN.
+// True if the values are bit-identical or both NaN.
 bool is_bit_identical(const double *a, const std::vector<double> &b) {
     for (size_t i = 0; i < b.size(); ++i) {
         if (std::isnan(b[i]) ? !std::isnan(a[i]) : memcmp(&a[i], &b[i], sizeof b[i]) != 0)
@@ -19,7 +16,7 @@ bool is_bit_identical(const double *a, const std::vector<double> &b) {
     return true;
 }
 
-// Computes one analysis frame with the exported functions of dsp/.
+// A plain computation of one analysis frame with the functions of dsp/.
 struct plain_frame {
     TAVO_FFT_CTX fft = {};
     std::vector<double> window;
@@ -53,7 +50,7 @@ struct plain_frame {
     }
 };
 
-// The onset envelope, one analysis frame after the other.
+// Returns the onset envelope, computed one analysis frame after the other.
 std::vector<double> envelope(const TAVO_BEAT_CTX &beat, int32_t size, int32_t hop) {
     const plain_frame frame(size);
     std::vector<double> change, next, now = frame.decibels(beat.signal, beat.mel_matrix);
@@ -78,13 +75,12 @@ TEST(BeatCtx, OneSecondHas42Frames) {
     run.ana[11024] = 16383.5;
     TAVO_BEAT_CTX beat = {};
     __beat_init(&run.ctx, &beat);
-    EXPECT_EQ(beat.frame_count, 42);  // (11025 - 512) / 256 + 1
+    EXPECT_EQ(beat.frame_count, 42);
     EXPECT_EQ(beat.frame_times[41], 0.02321995465f * 42.0f);
     EXPECT_EQ(beat.signal[3], -32768.0 / 32767.0);
     EXPECT_EQ(beat.signal[11024], 0.5);
     EXPECT_EQ(std::count(beat.rise_flags, beat.rise_flags + 11025, 0), 11025);
-    // The lowest triangle spans two mel steps of 71.743 Hz each, and its height is 2 / 143.486.
-    // Bins are 21.533 Hz apart.
+    // The lowest mel band is a triangle from 0 to 143 Hz, whose area is 1. It covers eight bins.
     const float lowest[] = {0.0f,       0.0041836f, 0.0083671f, 0.0125507f,
                             0.0111427f, 0.0069591f, 0.0027756f, 0.0f};
     for (int bin = 0; bin < 8; ++bin) EXPECT_NEAR(beat.mel_matrix[bin][0], lowest[bin], 1e-6);
@@ -93,9 +89,8 @@ TEST(BeatCtx, OneSecondHas42Frames) {
     EXPECT_TRUE(feat_mutex_mt == nullptr && feat_cond_mt == nullptr);
 }
 
-// Each worker computes a range of any number of frames. All sizes come from the arguments, not from
-// the context. The input includes silence, non-finite samples and weights, and weights that are
-// negative or zero.
+// The frame and hop sizes come from the arguments, not from the context. The input includes
+// silence, non-finite samples and weights, and weights that are negative or zero.
 TEST(OnsetEnvelope, EqualsTheFramesComputedOneByOne) {
     std::mt19937 random(6);
     const auto below = [&](uint32_t limit) { return static_cast<int32_t>(random() % limit); };
@@ -109,7 +104,7 @@ TEST(OnsetEnvelope, EqualsTheFramesComputedOneByOne) {
         const std::vector<double> samples = extreme_samples(n, 20 << round % 6, &random);
         std::copy(samples.begin(), samples.end(), beat->signal);
         if (round % 5 == 1) beat->signal[random() % n] = round % 2 == 0 ? NAN : INFINITY;
-        if (round % 8 == 2) {  // an infinite weight of a power that is zero at first
+        if (round % 8 == 2) {  // an infinite weight, and silence in the first half
             beat->mel_matrix[below(256)][below(36)] = INFINITY;
             std::fill_n(beat->signal, n / 2, 0.0);
         }
@@ -117,7 +112,7 @@ TEST(OnsetEnvelope, EqualsTheFramesComputedOneByOne) {
             beat->mel_matrix[i / 18][below(36)] = static_cast<float>(below(3) - 1);
         beat->half_frame = beat->band_count = 0;
         _getOnsetEnvelope(beat, size, hop);
-        beat->half_frame = size / 2;  // number of rows to release
+        beat->half_frame = size / 2;  // the number of rows that the destructor releases
         EXPECT_TRUE(is_bit_identical(beat->onset_env, envelope(*beat, size, hop)));
         EXPECT_EQ(beat->onset_env[beat->frame_count - 1], 0.0);
     }

@@ -1,7 +1,3 @@
-#include <gtest/gtest.h>
-
-#include <tuple>
-
 #include "beat/tempo.h"
 #include "tests/beat/beat_fixture.h"
 
@@ -26,34 +22,30 @@ int32_t estimate(std::vector<double> env, const std::vector<pulse_pair> &pairs =
 
 }  // namespace
 
-// Distant pairs correlate only at their own lags. The weights of the lags are:
-// lag  13     20     27     39     40     41     42     59     60     61     81
-// 0.767  0.994  0.948  0.693  0.671  0.650  0.629  0.347  0.335  0.324  0.161
-// The tempo is 2583.984375 frames per minute divided by the lag: 129 BPM for 20, 95 for 27.
+// Each pair of pulses correlates only at its own lag. A lag of 20 frames is 129 BPM, 27 is 95 BPM.
+// Where two rows differ only slightly in a weight, different tempos win.
 TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     const struct {
         std::vector<std::pair<size_t, double>> weights;  // of each lag
         int32_t bpm;
     } cases[] = {
         {{{13, 1}}, 198},
-        {{{12, 1}}, 90},            // 215 BPM is discarded
-        {{{18, 1}, {26, 1}}, 143},  // 0.967 and 0.964, on either side of 120 BPM
+        {{{12, 1}}, 90},            // 215 BPM is outside the range
+        {{{18, 1}, {26, 1}}, 143},  // on either side of 120 BPM, where the weight is largest
         {{{18, 1}, {26, 1.01}}, 99},
-        // Lag 20 scores 0.994, and its double adds 0.5 x 0.671: 1.330. The double's neighbours add
-        // 0.25 x 1.342 instead. Lag 27 scores 1.313 or 1.346, and then 1.300 or 1.360.
+        // The correlations at twice the lag and beside it raise the score.
         {{{20, 1}, {40, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {40, 1}, {27, 1.42}}, 95},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.371}}, 129},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.434}}, 95},
-        // Lag 60, the triple of 20, and its neighbours raise the score of lag 20. Lag 27 scores
-        // slightly less or slightly more.
+        // The correlations at three times the lag and beside it raise the score too.
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.413}}, 95},
-        {{{20, 1}, {59, 1}, {27, 1.1}}, 129},  // only 59: 1.109 and 1.043
-        // Lag 20 contributes 0.533 or 0.527 of its score, its double (64 BPM) the rest.
+        {{{20, 1}, {59, 1}, {27, 1.1}}, 129},
+        // The faster tempo wins if more than 0.53 of the sum of both correlations is its own.
         {{{20, 1}, {40, 1.30}}, 129},
         {{{20, 1}, {40, 1.33}}, 64},
-        // The longest lags: 42 beats 27, which scores 0.45; then 81 as the triple of 27.
+        // These are the longest lags.
         {{{42, 1}, {27, 0.475}}, 61},
         {{{27, 1}, {81, 5.6}}, 31},
     };
@@ -65,8 +57,8 @@ TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     }
 }
 
-// The excerpt is the last minute, or the second minute of a song longer than two minutes. A pair of
-// pulses inside it, 20 frames apart, outweighs the other pair.
+// The tempo is that of the second minute, or of the last one if the song is shorter than two
+// minutes. The stronger pair of pulses, 20 frames apart, counts only inside that minute.
 TEST(Tempo, DependsOnOneMinuteOnly) {
     const std::tuple<size_t, size_t, int32_t> cases[] = {{7750, 2583, 129}, {7750, 2582, 95},
                                                          {7750, 5146, 129}, {7750, 5147, 95},
@@ -77,14 +69,13 @@ TEST(Tempo, DependsOnOneMinuteOnly) {
     }
 }
 
-// Pulses every p frames correlate almost equally at p and 2p, so the weighting decides: p up to
-// about 144 BPM, otherwise 2p. Without a period, as in silence, the tempo is 90 BPM, and
-// calc_bpm_acf returns a value above every tempo.
+// The tempo of regular pulses is found in short excerpts too. A song without a period, such as
+// silence, has 90 BPM, and calc_bpm_acf returns a value above every tempo.
 TEST(Tempo, ShortExcerptsAndSilenceHaveATempo) {
     for (const auto &[length, period, bpm] :
          {std::tuple{1290u, 20u, 129},  // half a minute
           {42u, 20u, 129},              // one second: more lags than the transform has values
-          {10u, 4u, 80}}) {  // best in the circular correlation of 16 values; 161 BPM, so 32 frames
+          {10u, 4u, 80}}) {             // pulses 4 frames apart also match at a lag of 32
         std::vector<double> env(length);
         for (size_t i = 0; i < length; i += period) env[i] = 1.0;
         EXPECT_EQ(estimate(env), bpm) << length << " frames, period " << period;

@@ -1,4 +1,4 @@
-"""Helpers for the tests of the command: songs, running it, reading its output."""
+"""Helpers for the tests of the command. They make songs, run the command and read its output."""
 import json
 import os
 import pathlib
@@ -15,7 +15,7 @@ _songs = tempfile.TemporaryDirectory()
 
 
 def song(**options):
-    """Returns the path of a song. Each set of options is generated only once."""
+    """Returns the path of a song, which is generated once for each set of options."""
     words = [word for k, v in sorted(options.items()) for word in ("--" + k.replace("_", "-"), str(v))]
     path = pathlib.Path(_songs.name, "".join(words) + ".wav")
     if not path.exists():
@@ -32,7 +32,7 @@ def short_song(seed=1):
 
 
 def wav(seconds=2.0, rate=44100, channels=1, bits=16, tag=1, data_size=None, sample=b"\x12\x34"):
-    """Bytes of a WAV file, built without the project's own writer."""
+    """Returns a WAV file, without using the project's own writer."""
     frame = channels * bits // 8
     data = (sample * (frame * 8))[:frame] * round(seconds * rate)
     size = len(data) if data_size is None else data_size
@@ -41,13 +41,13 @@ def wav(seconds=2.0, rate=44100, channels=1, bits=16, tag=1, data_size=None, sam
     return head + b"data" + struct.pack("<I", size) + data
 
 
-# Prefix of a command that makes root obey file permissions.
+# Start of a command line with which file permissions also apply to root.
 AS_ORDINARY_USER = [] if os.getuid() != 0 else [
     "setpriv", "--inh-caps=-all", "--bounding-set=-dac_override,-dac_read_search"]
 
 
 def seconds(text):
-    """Converts h:mm:ss.mmm, m:ss or seconds."""
+    """Converts a time such as h:mm:ss.mmm or m:ss to seconds."""
     return sum(float(part) * 60 ** i for i, part in enumerate(reversed(text.split(":"))))
 
 
@@ -71,26 +71,26 @@ class Case(unittest.TestCase):
         self.assertEqual({p.name for p in self.folder.iterdir()}, set(names))
 
     def run_tavo(self, *arguments, status=0, printed=None, said=b"", before=(), **options):
-        """Runs the command in the folder of the test. Arguments may be bytes. printed: the expected standard
-        output. said: a part of the expected messages."""
+        """Runs the command in the folder of the test and checks its exit status. Also checks that `printed` is the
+        standard output and that `said` is a part of the messages. Arguments may be bytes."""
         options = {"input": b"", "cwd": self.folder, "timeout": 250, **options}
         done = subprocess.run([*before, TAVO, *arguments], capture_output=True, **options)
-        told = (arguments, done.stdout, done.stderr)
-        self.assertEqual(done.returncode, status, told)
-        self.assertIn(printed, (None, done.stdout), told)
-        self.assertIn(said, done.stderr, told)
+        details = (arguments, done.stdout, done.stderr)
+        self.assertEqual(done.returncode, status, details)
+        self.assertIn(printed, (None, done.stdout), details)
+        self.assertIn(said, done.stderr, details)
         return done
 
     def start(self, *arguments, **options):
-        """Starts the command in its own session. It ends with the test."""
+        """Starts the command in a session of its own. It is killed when the test ends."""
         options = {**dict.fromkeys(("stdin", "stdout", "stderr"), subprocess.PIPE), **options}
         process = self.enterContext(subprocess.Popen([TAVO, *arguments], cwd=self.folder, start_new_session=True,
                                                      **options))
-        self.addCleanup(process.kill)  # runs before the context exits
+        self.addCleanup(process.kill)  # before the context waits for the process
         return process
 
     def wait_until(self, condition):
-        """Waits until the condition is true. Returns its value."""
+        """Waits until the condition is true and returns its value."""
         for _ in range(3000):
             if found := condition():
                 return found
@@ -98,13 +98,13 @@ class Case(unittest.TestCase):
         self.fail("it did not happen within a minute")
 
     def objects(self, text):
-        """Parses one JSON object per line, in strict UTF-8 and without NaN or infinity."""
+        """Parses lines of one JSON object each. They must be valid UTF-8 without NaN or infinity."""
         self.assertTrue(text == b"" or text.endswith(b"\n"), text)
         return [json.loads(line.decode("utf-8"), parse_constant=self.fail)
                 for line in text.split(b"\n")[:-1]]
 
     def run_json(self, *arguments, status=0, **options):
-        """Returns the results without cpu_ms."""
+        """Runs the command and returns its results, without cpu_ms."""
         results = self.objects(self.run_tavo("--format", "json", *arguments, status=status, **options).stdout)
         for result in results:
             self.assertTrue(result.pop("cpu_ms", -1) >= 0 or result["status"] != "ok", result)

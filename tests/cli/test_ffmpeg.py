@@ -1,11 +1,11 @@
-"""Tests that ffmpeg decodes files that the library refuses, and cuts clips."""
+"""Tests that ffmpeg decodes files that the library refuses and cuts clips, and that offset_ms gives players' times."""
 import os
 import pathlib
 import signal
 import subprocess
 
 import numpy as np
-from command_case import Case, song
+from command_case import Case, song, wav
 
 SONG = song(seconds=20, bpm=120, loud_at=8)
 
@@ -14,15 +14,29 @@ ENCODED = {  # file name: options for ffmpeg
     "a.aiff": "", "alac.m4a": "-c:a alac", "a.opus": "", "a.webm": "-c:a libopus", "a.wma": "",
     "-b:c.mkv": "-c:a flac",
     "late.mkv": "-f lavfi -i testsrc=size=64x64:rate=10:duration=20 -itsoffset 0.5 -i SONG -map 1 -map 2"}
-FAILING = {  # script of a fake ffmpeg: part of the message
+FAILING = {  # script that replaces ffmpeg: part of the message
     "kill -9 $$": "ffmpeg was ended by signal 9", "echo '[x @ 0x1] bad box.' >&2; echo y >&2; exit 1": "ffmpeg: bad box.",
     "head -c 300000 a.wav; exit 3": "ffmpeg ended with status 3.",
     "head -c 44 a.wav; cat /dev/zero": "longer than a file of its size can hold", "exit 0": "decodes nothing", "exec sleep 60": ""}
 CLIPPED = {"a.wav": "", "a.mp3": "", "bare.mp3": "-write_xing 0", "a.m4a": "", "a.flac": "", "a.ogg": "", "a.aac": "", "a.webm": "-c:a libopus",
            "late.mkv": ENCODED["late.mkv"]}
+ENCODERS = {  # file name: command for n.wav
+    "n.flac": "flac --totally-silent n.wav", "constant.mp3": "lame --quiet -b 128 n.wav constant.mp3",
+    "variable.mp3": "lame --quiet -V 2 n.wav variable.mp3", "bare.mp3": "lame --quiet -t n.wav bare.mp3",
+    "mono.mp3": "lame --quiet -m m n.wav mono.mp3", "n.m4a": "ffmpeg -v error -i n.wav -c:a aac -b:a 128k n.m4a",
+    "edited.m4a": "cp n.m4a edited.m4a", "tagged.m4a": "ffmpeg -v error -i n.wav -metadata comment=" + "x" * 84 + " tagged.m4a",
+    "n.aac": "ffmpeg -v error -i n.wav -c:a aac -b:a 128k n.aac", "n.ogg": "oggenc --quiet n.wav"}
+OFFSETS = {"edited.m4a": 47.891, "tagged.m4a": 47.891, "n.m4a": 23.220, "bare.mp3": -11.995, "mono.mp3": 25.057,
+           "constant.mp3": 13.061, "variable.mp3": 13.061}  # ms; 0 for other files
 RATE, FRAME = 44100, 1152  # Hz; samples of the longest compressed frame
 NAMING_OTHERS = {"a.m3u8": b"#EXTM3U\n#EXT-X-TARGETDURATION:60\n#EXTINF:60,\na.ts\n#EXT-X-ENDLIST\n",
                  "a.ffconcat": b"ffconcat version 1.0\nfile a.ts\n", "a.mkv": b"ffconcat version 1.0\nfile a.ts\n"}
+
+
+def find(part, sound):
+    """Returns the position in the sound that is most similar to its part, in samples."""
+    size = len(part) + len(sound)
+    return np.fft.irfft(np.fft.rfft(sound, size) * np.fft.rfft(part, size).conj(), size).argmax()
 
 
 def children(pid):
@@ -40,9 +54,9 @@ class Ffmpeg(Case):
         program.chmod(0o755)
         return {"env": {"PATH": f"{program.parent}:/usr/bin:/bin"}}
 
-    def sound(self, path):
-        """Returns the samples of a file as a player hears them."""
-        words = ["-i", path, "-af", "aresample=async=1:first_pts=0", "-ac", "1", "-ar", str(RATE), "-f", "s16le", "-"]
+    def sound(self, path, filters="aresample=async=1:first_pts=0"):
+        """Returns the samples of a file that a player plays."""
+        words = ["-i", path, "-af", filters, "-ac", "1", "-ar", str(RATE), "-f", "s16le", "-"]
         done = subprocess.run(["ffmpeg", "-nostdin", "-v", "error", *words], cwd=self.folder, check=True, capture_output=True)
         return np.frombuffer(done.stdout, np.int16).astype(float)
 
@@ -54,11 +68,30 @@ class Ffmpeg(Case):
             (path,) = self.folder.glob(f"clips/{result['file'][2:]}.clip.*")
             clip, source = self.sound(path), self.sound(result["file"])
             self.assertAlmostEqual(len(clip), (result["hl_end_ms"] - result["hl_pos_ms"]) * RATE / 1000, delta=FRAME, msg=path)
-            size = len(clip) + len(source)
-            match = np.fft.irfft(np.fft.rfft(source, size) * np.fft.rfft(clip, size).conj(), size)
             start = (result["hl_pos_ms"] - result["offset_ms"]) * RATE / 1000
-            self.assertAlmostEqual(match.argmax(), start, delta=RATE / 1000, msg=path)
+            self.assertAlmostEqual(find(clip, source), start, delta=RATE / 1000, msg=path)
         self.assertEqual(len(os.listdir(self.folder / "clips")), len(CLIPPED))
+
+    def test_offset_is_the_delay_of_the_library(self):
+        """Finds a part of the noise in the sound of a player and in that of the library."""
+        noise = np.random.default_rng(1).normal(0, 9000, 6 * RATE)
+        samples = np.clip(noise + np.roll(noise, 1), -32768, 32767).astype("<i2").repeat(2)  # stereo
+        self.put("n.wav", wav(channels=2, seconds=0)[:40] + samples.nbytes.to_bytes(4, "little") + samples.tobytes())
+        part = self.sound("n.wav")[3 * RATE:4 * RATE]
+        for name, command in ENCODERS.items():
+            subprocess.run(command.split(), check=True, cwd=self.folder)
+            path = self.folder / name
+            if name == "edited.m4a":  # its edit list states the delay of Apple's encoder
+                self.put(name, path.read_bytes().replace(b"\0\0\4\0\0\1\0\0", b"\0\0\x08\x40\0\1\0\0", 1))
+            if name == "tagged.m4a":  # Apple's tag states that delay, which overrides the edit list
+                tag = b"".join((len(atom) + 4).to_bytes(4, "big") + atom for atom in (
+                    b"mean\0\0\0\0com.apple.iTunes", b"name\0\0\0\0iTunSMPB", b"data\0\0\0\1\0\0\0\0 00000000 00000840 00000000 00040998"))
+                before, comment = path.read_bytes().split(b"\xa9cmt", 1)
+                self.put(name, before + b"----" + tag + comment[len(tag):])
+            (result,) = self.run_json("-m", "beats", "--force", "--click", "click.wav", name)  # its clicks are quiet
+            late = (find(part, self.sound("click.wav")) - find(part, self.sound(name, "anull"))) * 1000 / RATE
+            self.assertAlmostEqual(result["offset_ms"], late, delta=0.2, msg=name)
+            self.assertEqual(result["offset_ms"], OFFSETS.get(name, 0), name)
 
     def test_clip_fades(self):
         self.put("a.wav", source=SONG)
@@ -76,7 +109,7 @@ class Ffmpeg(Case):
         self.run_tavo("-l", "2", "--clip", "c.txt", "a.wav", status=1, said=b"output format for 'file:c.txt'")
         self.assert_only("a.wav", "bin")
 
-    def test_decodes_what_the_library_refuses(self):
+    def test_ffmpeg_decodes_refused_files(self):
         for name, words in ENCODED.items():
             self.encode(name, words)
         self.put("notes.txt", b"This is a letter, not a song.\n" * 99)
@@ -89,20 +122,20 @@ class Ffmpeg(Case):
             self.assertAlmostEqual(result["hl_pos_ms"], 8000 + late, delta=400, msg=result)
         self.run_tavo("24.wav", status=1, said=b"ffmpeg, which may read it, is not installed", env={"PATH": "bin"})
 
-    def test_what_comes_through_a_pipe_is_like_a_file(self):
+    def test_a_pipe_is_read_like_a_file(self):
         for path in (SONG, self.encode("a.m4a", ""), self.encode("a.opus", "")):
             (piped,) = self.run_json("/dev/stdin", input=path.read_bytes())
             self.assertEqual(piped, {**self.run_json(path)[0], "file": "/dev/stdin"})
         self.run_tavo("/dev/stdin", input=b"RIFF", status=1, said=b"Only 4 bytes")
 
-    def test_reads_no_other_file(self):
+    def test_files_cannot_name_other_files(self):
         self.encode("a.ts", "")
         self.assertEqual(self.run_json("a.ts")[0]["decoder"], "ffmpeg")
         for name, content in NAMING_OTHERS.items():
             self.put(name, content)
             self.run_tavo(name, status=1, said=b"Format not on whitelist")
 
-    def test_a_failing_ffmpeg_fails_its_file_alone(self):
+    def test_failing_ffmpeg_fails_only_its_file(self):
         self.put("a.wav")
         self.put("b.mkv", b"no song at all" * 9)
         for script, said in FAILING.items():

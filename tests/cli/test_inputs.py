@@ -1,4 +1,4 @@
-"""Tests how the files to analyse are found: names with any bytes, folders, lists."""
+"""Tests how the command finds the files to analyse: names with any bytes, folders and lists."""
 import csv
 import io
 import os
@@ -19,7 +19,7 @@ ODD_NAMES = [
 class Inputs(Case):
     def setUp(self):
         super().setUp()
-        for name in ("a.wav", "b.txt", "inner/deep/d.wav", "../other/o.wav"):  # recognised by content
+        for name in ("a.wav", "b.txt", "inner/deep/d.wav", "../other/o.wav"):  # the content counts, not the name
             self.put("music/" + name)
         self.put("music/letter.mp3", b"Dear reader, this is no song. " * 50)
         self.put("music/short", b"x")
@@ -28,7 +28,7 @@ class Inputs(Case):
         os.mkfifo(self.folder / "music/pipe")
 
     def found(self, *arguments, **options):
-        """Returns the names of the results as bytes."""
+        """Runs the command and returns the names in its results as bytes."""
         results = self.run_json("--mode", "highlight", *arguments, **options)
         return [unquote_to_bytes(r["file_bytes"]) if "file_bytes" in r else r["file"].encode() for r in results]
 
@@ -50,7 +50,7 @@ class Inputs(Case):
         self.put(deep)
         self.put("-dash.wav")
         self.assertEqual(self.found("--", "-dash.wav", deep), [b"-dash.wav", deep.encode()])
-        # Text shows one name per line and no control characters.
+        # In text each name is on one line and has no control characters.
         done = self.run_tavo("--mode", "highlight", *ODD_NAMES, b"no\nsuch\x1b\xe9", status=1)
         self.assertEqual(done.stderr, rb"tavo: no\nsuch\x1B\xE9: The file does not exist." + b"\n")
         lines = done.stdout.decode("utf-8").split("\n")
@@ -84,7 +84,7 @@ class Inputs(Case):
                 ("music/b.txt --files-from list", b"", [b, a]),
                 ("-", b"\xef\xbb\xbf#EXTM3U\r\n#EXTINF:60,Song\r\nmusic/a.wav\r\n\r\n#1.wav\r\n", [a, b"#1.wav"])):
             self.assertEqual(self.found(*words.split(), input=text), expected, text)
-        for words, text, said in (  # not lists
+        for words, text, said in (  # these are not lists
                 ("-", sound, b"sound (WAV), not a list"), ("-0 -", sound, b"sound (WAV)"),
                 ("--files-from music/a.wav", b"", b"name it as FILE"),
                 ("--files-from nowhere", b"", b"list of files cannot be read"),
@@ -93,13 +93,13 @@ class Inputs(Case):
         self.run_tavo("--format", "json", "-", said=b"names no files", printed=b"")
 
     def test_a_list_is_served_as_it_comes(self):
-        """Each result is printed before the next name is read. Memory does not grow with the number of names."""
-        sanitizer = "quarantine_size_mb=0:thread_local_quarantine_size_kb=0"  # freed memory is not kept
+        """The command prints each result before it reads the next name. Its memory does not grow with the list."""
+        sanitizer = "quarantine_size_mb=0:thread_local_quarantine_size_kb=0"  # releases freed memory at once
         process = self.start("--format", "json", "-m", "highlight", "-", stderr=subprocess.DEVNULL,
                              env={**os.environ, "ASAN_OPTIONS": sanitizer})
 
         def answer(names):
-            """Returns the name of the last result and the memory of the command in KiB."""
+            """Sends names. Returns the file of the last result and the memory that the command uses, in KiB."""
             threading.Thread(target=send, args=(process, names)).start()
             for _ in range(names.count(b"\n")):
                 (result,) = self.objects(process.stdout.readline())
@@ -111,5 +111,5 @@ class Inputs(Case):
         _, before = answer(missing * 12000)
         name, after = answer(missing * 40000 + b"music/b.txt\n")
         self.assertEqual(name, "music/b.txt")
-        self.assertLess(after - before, 4000)  # the names alone are 8000 KiB
+        self.assertLess(after - before, 4000)  # less than the size of the names
         self.assertEqual((process.communicate()[0], process.returncode), (b"", 1))

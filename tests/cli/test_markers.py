@@ -1,4 +1,4 @@
-"""Tests marker files with other programs or against the published rules of the editors."""
+"""Tests marker files with programs that read them, or against the published rules of the editors."""
 import csv
 import json
 import os
@@ -11,21 +11,21 @@ import xml.etree.ElementTree as ElementTree
 from command_case import TAVO, Case, seconds, song, standard_song
 
 EDITORS = pathlib.Path(__file__).parents[2] / "docs/EDITORS.md"
-NAME = "a<b>&\"c\" é.wav"  # needs escaping in XML and in a URL
-FPS = {  # frames per second, timecode numbers per second, numbers dropped per minute
+NAME = "a<b>&\"c\" é.wav"  # must be escaped in XML and in a URL
+FPS = {  # frames per second, frame numbers per second in a timecode, numbers skipped per minute
     "23.976": (24000 / 1001, 24, 0), "24": (24, 24, 0), "25": (25, 25, 0), "29.97": (30000 / 1001, 30, 0),
     "29.97df": (30000 / 1001, 30, 2), "30": (30, 30, 0), "50": (50, 50, 0), "59.94": (60000 / 1001, 60, 0),
     "59.94df": (60000 / 1001, 60, 4), "60": (60, 60, 0)}
 CLIP = "project/sequence/spine/asset-clip"
-FCPXML = {  # from Final Cut Pro's DTD: paths of elements and their required attributes
+FCPXML = {  # elements and their required attributes, from Final Cut Pro's DTD
     ".": "version", "resources": "", "resources/format": "id frameDuration",
     "resources/asset": "id src start duration hasAudio", "project": "name", "project/sequence": "format duration",
     "project/sequence/spine": "", CLIP: "ref duration", CLIP + "/marker": "start duration value"}
 
 
 def timecodes(base, dropped):
-    """Maps timecodes, which start at one hour, to frame numbers. Drop-frame timecode skips the first numbers of each
-    minute, except every tenth minute."""
+    """Returns the frame number of each timecode, from one hour on. Drop-frame timecode skips the first frame numbers
+    of each minute, except every tenth minute."""
     places = ((minute, second, frame) for minute in range(5) for second in range(60) for frame in range(base)
               if second or frame >= dropped or minute % 10 == 0)
     return {f"01:{minute:02}:{second:02}{';' if dropped else ':'}{frame:02}": number
@@ -50,7 +50,7 @@ class Markers(Case):
         self.put(NAME, source=standard_song())
 
     def write(self, form, words, only=""):
-        """Writes a marker file. Returns its path and the expected marks: start and end in seconds, name."""
+        """Writes a marker file. Returns its path and the expected marks: their start, end (in seconds) and name."""
         (result,) = self.run_json(*words.split(), NAME)
         done = self.run_tavo("--format", form, "--force", *only.split(), *words.split(), NAME)
         late = self.late = result["offset_ms"]
@@ -64,7 +64,7 @@ class Markers(Case):
         return self.folder / done.stdout.decode().strip(), marks
 
     def assert_marks(self, found, expected, delta=0.0006):
-        """Compares times approximately and names exactly."""
+        """Checks that names are equal and times approximately equal."""
         self.assertEqual([mark[-1] for mark in found], [mark[-1] for mark in expected])
         for mark, wanted in zip(found, expected):
             for time, right in zip(mark[:-1], wanted[:-1], strict=True):
@@ -93,7 +93,7 @@ class Markers(Case):
         self.assert_marks(segments, marks[:1] + until_next([(m[0], m[2]) for m in marks[1:]], self.end))
 
     def test_chapters(self):
-        """Uses an MP3 file, because players skip the delay of its encoder."""
+        """The song is an MP3 file, because players skip the delay of its encoder."""
         subprocess.run(["lame", "--quiet", standard_song(), self.folder / NAME], check=True)
         for words in ("--length 12", "--length 12 --mode highlight"):
             path, marks = self.write("ffmetadata", words)
@@ -103,7 +103,7 @@ class Markers(Case):
             self.assertGreater(self.late, 10)
 
     def test_frames(self):
-        """Uses a song of several minutes, because drop-frame timecode skips numbers at each minute."""
+        """The song lasts several minutes, because drop-frame timecode skips numbers at each minute."""
         self.put(NAME, source=song(seconds=190, bpm=120, rate=8000, channels=1))
         for fps, (rate, base, dropped) in FPS.items():
             path, marks = self.write("edl", "--mode beats", "--fps " + fps)
@@ -132,7 +132,7 @@ class Markers(Case):
         self.assert_marks(found, [(a, b - a, name) for a, b, name in marks], 1.001 / 29.97)
 
     def test_recipes(self):
-        """Runs the commands of docs/EDITORS.md in a shell."""
+        """The commands in docs/EDITORS.md work in a shell."""
         subprocess.run(["lame", "--quiet", standard_song(), self.folder / "song.mp3"], check=True)
         (result,) = self.run_json("song.mp3")
         start = f"{(result['hl_pos_ms'] - result['offset_ms']) / 1000:.3f}"

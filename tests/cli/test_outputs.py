@@ -1,11 +1,11 @@
-"""Tests written files: labels, click tracks and pages. Each is complete or does not exist."""
+"""Tests the files that the command writes. Each is complete or does not exist."""
 import os
 import resource
 
 from command_case import AS_ORDINARY_USER, Case, short_song, wav
 
 LABELS = ["--format", "labels"]
-ALL = (  # arguments, file for song.wav, content
+ALL = (  # arguments, the file written for song.wav, a part of its content
     (LABELS, "song.wav.labels.txt", b"highlight"), (["--click", "c.wav"], "c.wav", b"RIFF"),
     (["--report", "page.html"], "page.html", b"song.wav"), (["--clip", "k.wav", "-l", "2"], "k.wav", b"RIFF"))
 
@@ -15,7 +15,7 @@ class Outputs(Case):
         super().setUp()
         self.song = self.put("song.wav")
 
-    def test_beside_each_other_and_only_when_asked(self):
+    def test_files_are_written_only_on_request(self):
         before = self.song.read_bytes()
         self.run_tavo("song.wav")
         self.assert_only("song.wav")
@@ -28,7 +28,7 @@ class Outputs(Case):
         self.assertEqual(self.song.read_bytes(), before)
         self.assertEqual([(self.folder / name).stat().st_mode & 0o777 for name in written], 3 * [0o640])
 
-    def test_what_exists_stays(self):
+    def test_existing_files_are_kept_without_force(self):
         names = {"song.wav", "page_songs"}
         for arguments, name, content in (*ALL, (["--report", "page.html", "song.wav"], "page.html", b"song.wav")):
             target = self.put(name, b"mine\n")
@@ -39,7 +39,7 @@ class Outputs(Case):
             self.assertIn(content, target.read_bytes())
         self.assert_only(*names)
 
-    def test_places_that_cannot_be_written(self):
+    def test_unwritable_places_are_reported(self):
         before = self.song.read_bytes()
         for option, places in (("--click", "song.wav . nowhere/c.wav"), ("--report", "song.wav ./song.wav . nowhere/page.html"),
                                ("--clip", "song.wav ./song.wav nowhere/c.wav")):
@@ -67,12 +67,12 @@ class Outputs(Case):
             self.assertRegex(done.stderr, b"cannot be written: file too large|the disk may be full|clip k.wav cannot be written")
         self.assert_only("song.wav", "silent.wav", "bad.wav")
 
-    def test_another_folder(self):
+    def test_output_dir(self):
         self.put("x/song.wav")
         self.put("y/song.wav", source=short_song(seed=7))
         out = self.folder / "out"
         out.mkdir()
-        for _ in range(2):  # y is refused even if it finishes first
+        for _ in range(2):  # y/song.wav is refused even if its analysis ends first
             self.run_tavo(*LABELS, "--force", "-o", "out", "-j", "2", "x", "y", status=1,
                           said=b"tavo: y/song.wav: Its file out/song.wav.", printed=b"out/song.wav.labels.txt\n")
         self.assertEqual(os.listdir(out) + os.listdir(self.folder / "x"), ["song.wav.labels.txt", "song.wav"])
@@ -80,7 +80,7 @@ class Outputs(Case):
         self.run_tavo(*LABELS, "--force", "-o", "out", "x", status=1, before=AS_ORDINARY_USER,
                       said=b"cannot be written: permission denied")
 
-    def test_each_file_once(self):
+    def test_each_file_is_written_once(self):
         self.put("other.wav")
         self.run_tavo(*LABELS, "song.wav", "./song.wav", "other.wav",
                       said=b"tavo: ./song.wav: named more than once, done once.\n",
@@ -88,7 +88,7 @@ class Outputs(Case):
         mine = self.put("song.wav.labels.txt", b"mine\n")
         self.run_tavo(*LABELS, "--skip-existing", "song.wav", "other.wav", ".", said=b"4 inputs left out", printed=b"")
         self.assertEqual(mine.read_bytes(), b"mine\n")
-        # Names of 248 bytes are too long for the full name of a marker file.
+        # The names of these songs are too long to be part of a marker file's name.
         names = ["\u00e9" * 120 + ending for ending in ("-one.wav", "-two.wav")]
         for name in names:
             self.put(name)

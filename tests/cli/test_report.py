@@ -1,4 +1,4 @@
-"""Tests the report page in Debian's Chromium without a window."""
+"""Tests the report page in Chromium, without a window."""
 import json
 import os
 import re
@@ -55,7 +55,7 @@ class Browser(Case):
 
 
 class Report(Browser):
-    def test_a_song(self):
+    def test_song_page(self):
         self.put("song.wav", source=standard_song())
         (result,) = self.run_json("--length", "12", "--report", "page.html", "song.wav")
         self.assertNotRegex((self.folder / "page.html").read_text(),
@@ -72,8 +72,8 @@ class Report(Browser):
             self.wait(f"Math.abs(player.now() - {ms}) < 1")
         self.script("seek(arguments[0])", result["hl_end_ms"] - 200)
         self.click("loop", "play")
-        self.wait(f"player.now() < {start + 3000}")  # has looped back to the start
-        self.wait("scheduled.length > 0")  # clicks are scheduled
+        self.wait(f"player.now() < {start + 3000}")  # the loop started again
+        self.wait("scheduled.length > 0")  # clicks
         self.click("play")
 
         (timeline,) = self.find("#timeline")
@@ -92,7 +92,7 @@ class Report(Browser):
         self.put("song.wav", source=standard_song())
         (result,) = self.run_json("--length", "12", "--report", "page.html", "song.wav")
         self.show("page.html")
-        self.click("tobeat", "out", "out", "out")  # 16 s of 60
+        self.click("tobeat", "out", "out", "out")  # shows a part of the song
         start, end = self.script("return [view.from, view.to]")
         root = ElementTree.fromstring(self.script("return pictureSvg()"))
         lines = [e for e in root.iter() if e.get("class") in ("beat", "start")]
@@ -107,20 +107,20 @@ class Report(Browser):
             self.run_tavo("--report", "page.html", "--force", *arguments, name)
             return json.loads(re.search(r'id="data">(.*?)</script>', (self.folder / "page.html").read_text())[1])
 
-        # 4 s of silence, then 6 s of a square wave at half of full scale.
+        # Silence for 4 s is followed by a square wave of 6 s at half of full scale.
         rate, level = 8000, 32768 // 2
         loud = b"".join(struct.pack("<h", level if i // 40 % 2 else -level) for i in range(6 * rate))
         self.put("steps.wav", wav(seconds=10, rate=rate)[:44] + bytes(2 * 4 * rate) + loud)
         page = view("steps.wav", "--mode", "highlight")
-        wave = page["wave"]  # 4000 columns of 2.5 ms; the sound starts at column 1600
+        wave = page["wave"]  # pairs for 4000 columns of 2.5 ms; the wave starts at column 1600
         self.assertEqual((len(wave), {*wave[:3198]}, {*wave[3202:]}), (8000, {0}, {-127, 127}))
-        # 10 log10(1 + share / 4): the sound fills a third, two thirds and all of a window. Its mean square is 1/4.
+        # The wave fills a third, two thirds and all of a window.
         for value, expected in zip([*page["loudness"], page["mean"]], (0.348, 0.669, 0.969, 0.662), strict=True):
             self.assertAlmostEqual(value, expected, delta=0.001)
         for seconds, searched in ((60, [0, 42000]), (100, [18000, 52000])):
             self.put("song.wav", source=song(seconds=seconds, bpm=120, rate=8000, channels=1))
             self.assertEqual(view("song.wav", "--mode", "highlight")["searched_ms"], searched)
-        # Players skip the delay of an MP3 encoder.
+        # The page shows the times of players, which skip the delay of an MP3 encoder.
         subprocess.run(["lame", "--quiet", standard_song(), self.folder / "song.mp3"], check=True)
         page = view("song.mp3", "--length", "12")
         (result,) = self.run_json("--length", "12", "song.mp3")
@@ -130,7 +130,7 @@ class Report(Browser):
         for ms, expected in zip(times, shifted, strict=True):
             self.assertAlmostEqual(ms, expected, delta=0.01)
 
-    def test_screens(self):
+    def test_pages_fit_the_screen_and_its_colours(self):
         self.put("song.wav", source=standard_song())
         self.run_tavo("--report", "page.html", "song.wav")
         self.run_tavo("--report", "index.html", "song.wav", "song.wav")

@@ -1,4 +1,4 @@
-"""Tests output in every format: results, refused files, usage errors."""
+"""Tests what the command prints: results in every format, reasons for refused files, usage errors."""
 import csv
 import io
 import os
@@ -31,13 +31,13 @@ USAGE = [
     ("--normalize --no-ffmpeg a.wav", "needs the ffmpeg"), ("--normalize -m beats a.wav", "needs a highlight"),
     ("--normalize --store a.db a.wav", "cannot be combined with --store"),
 ]
-REFUSED = {  # content, part of the sentence
+REFUSED = {  # file: its content and a part of the reason
     "empty.wav": (b"", "empty"),
     "fifteen.wav": (b"RIFF\0\0\0\0WAVEfmt", "too short to be audio: it has 15 bytes"),
     "text.wav": (b"This is a letter, not a song.\n" * 99, "not recognised"),
     "movie.wma": (ASF + bytes(500), "ASF (Windows Media), a format that is not read. ffmpeg, which may"),
     "24.wav": (wav(bits=24), "not 16-bit integer PCM at up to 48000 Hz, which is all that is read."),
-    "96k.wav": (wav(rate=96000), "48000 Hz"),
+    "8.wav": (wav(bits=8, tag=7), "not 16-bit"), "tag.wav": (wav(tag=300), "not 16-bit"), "96k.wav": (wav(rate=96000), "48000 Hz"),
     "1s.wav": (wav(seconds=1.0), "lasts 1.000 s"), "7999.wav": (wav(rate=7999), "7999 Hz"),
     "no-channels.wav": (wav(seconds=0.0)[:22] + b"\0\0" + wav()[24:], "WAV file is damaged or"),
     "no-data.wav": (wav()[:36], "no usable audio stream"),
@@ -73,26 +73,26 @@ class Results(Case):
             self.assertEqual(list(result), KEYS + keys)
             self.assertEqual([result[key] for key in KEYS], ["song.wav", mode, "ok", 44100, 2, 60000, 0])
             if mode != "beats":
-                # In mode both the highlight of a WAV file is rounded to a whole second.
+                # In mode both the highlight of a WAV file is at a whole second.
                 self.assertAlmostEqual(result["hl_pos_ms"], 20000, delta=1000)
                 self.assertEqual(result["hl_end_ms"], result["hl_pos_ms"] + 12000)
             if mode != "highlight":
-                self.assertIn(result["bpm"], (117, 120, 123))  # 120 and the nearest tempos with a whole number of hops
+                self.assertIn(result["bpm"], (117, 120, 123))  # beat periods are whole numbers of hops
                 self.assertTrue(10 < result["beat_count"] == len(result["beats_ms"]))
                 few = self.analyse(f"--mode {mode} --max-beats 3")
                 self.assertLess(few["beat_count"], result["beat_count"])
         self.assertNotIn("hl_end_ms", few)
         self.assertEqual(self.analyse(), self.analyse("--mode both"))
-        self.assertEqual(self.analyse("--length 86400")["hl_end_ms"], 60000)  # end of the song
+        self.assertEqual(self.analyse("--length 86400")["hl_end_ms"], 60000)  # at the end of the song
 
-    def test_csv_and_text_say_the_same(self):
+    def test_csv_and_text_have_the_same_results(self):
         result = self.analyse()
         done = self.run_tavo("--format", "csv", "song.wav", "missing, really.wav", status=1)
         rows = list(csv.DictReader(io.StringIO(done.stdout.decode(), newline=""), strict=True))
         self.assertEqual(list(rows[0]), KEYS + ["hl_pos_ms", "hl_end_ms", "hl_refined"] + BEATS + ["cpu_ms", "error"])
         for key in KEYS[:-1] + ["hl_pos_ms", "bpm", "beat_count"]:
             self.assertEqual(rows[0][key], str(result[key]))
-        single = struct.Struct(f"{result['beat_count']}f")  # precision of the library
+        single = struct.Struct(f"{result['beat_count']}f")  # the library stores times in single precision
         self.assertEqual(single.pack(*map(float, rows[0]["beats_ms"].split())), single.pack(*result["beats_ms"]))
         self.assertEqual([rows[1][key] for key in ("file", "status", "bpm", "error")],
                          ["missing, really.wav", "failed", "", "The file does not exist."])
@@ -105,8 +105,8 @@ class Results(Case):
   beats      {result['beat_count']}, from {first} to {last}
 """)
 
-    def test_a_coarse_highlight_is_called_so(self):
-        # This song is too quiet for the refinement. The coarse curve has a value every 2 s.
+    def test_coarse_highlight_is_marked(self):
+        # At a level of 1/16 the song is too quiet for the refinement, so its highlight is a multiple of 2 s.
         loud = standard_song().read_bytes()
         samples = memoryview(loud[44:]).cast("h")
         for level, refined in ((1, True), (16, False)):

@@ -1,4 +1,4 @@
-"""Tests results in a database. Each song is stored once, with the same result as without a store."""
+"""Tests --store. Each song is stored once, with the result that it has without a store."""
 import json
 import os
 import random
@@ -41,11 +41,11 @@ class Store(Case):
             self.assert_same(row, result)
             self.assertEqual([row[key] for key in ("size", "mtime_ns", "mode", "length_s", "max_beats")],
                              [state.st_size, state.st_mtime_ns, "both", 5, 0])
-        # All songs are known, including the failed one.
+        # A second run knows all songs, including the failed one.
         self.run_tavo("--store", "sqlite:x.db", "--format", "json", *words, status=1,
                       said=b"0 stored, 3 known already (1 failed; --retry-failed)", printed=b"")
 
-    def test_what_is_analysed_again(self):
+    def test_changed_requests_and_files_are_analysed_again(self):
         self.put("a.wav")
         self.put("bad.wav", content=b"RIFF" + bytes(60))
         for words, status, stored in (("", 1, 2), ("", 1, 0), ("--retry-failed", 1, 1), ("--redo", 1, 2),
@@ -72,13 +72,13 @@ class Store(Case):
             for name in names[i::5]:
                 self.assert_same(rows[name.encode()], result)
 
-    def test_stored_as_time_passes(self):
+    def test_results_are_stored_while_a_list_is_read(self):
         self.put("a.wav")
         self.run_tavo(*STORE, "a.wav")
         send(self.start(*STORE, "-"), b"./a.wav\n")
         self.wait_until(lambda: b"./a.wav" in self.rows())
 
-    def test_a_store_that_does_not_answer(self):
+    def test_unusable_stores_are_reported(self):
         self.put("a.wav")
         self.run_tavo(*STORE, "a.wav")
         with sqlite3.connect(self.folder / "x.db", isolation_level=None) as other:
@@ -96,19 +96,19 @@ class Store(Case):
             done = self.run_tavo("--store", url, "a.wav", status=1, said=words)
             self.assertNotRegex(done.stderr, rb"\bme\b|\bse\b|\bc\b|\br\b|\bet\b|trying again")
 
-    def test_written_out_again(self):
+    def test_from_store(self):
         names = self.put_songs(3)
         self.run_tavo(*STORE, *names, "--length", "5")
         expected = self.run_json(*names, "--length", "5")
         for name in names:
-            os.unlink(self.folder / name)  # only the store is read
+            os.unlink(self.folder / name)  # the songs are no longer needed
         self.assertEqual(self.run_json(*STORE, "--from-store", "--length", "5"), expected)
         self.run_tavo(*STORE, "--from-store", "--length", "5", "--format", "labels")
         start, end = (expected[1][key] / 1000 for key in ("hl_pos_ms", "hl_end_ms"))
         self.assertIn(f"{start:.6f}\t{end:.6f}\thighlight", (self.folder / "song 1.wav.labels.txt").read_text())
         self.run_tavo(*STORE, "--from-store", status=2)
         self.run_tavo("--store", "", "--format", "json", names[0], status=2, said=b"--store", printed=b"")
-        # Reading works although the store and its folder are not writable.
+        # Reading does not need write access to the store and its folder.
         for path in self.folder.glob("x.db-*"):
             path.unlink()
         (self.folder / "x.db").chmod(0o444)
@@ -117,20 +117,20 @@ class Store(Case):
         self.assertEqual(self.run_json(*STORE, "--from-store", "--length", "5", before=AS_ORDINARY_USER), expected)
 
     def test_markers_of_a_run_that_was_killed(self):
-        """The marker files were written, but the rows of the songs were lost."""
+        """After a run was killed, marker files may exist whose songs are not in the store."""
         names = self.put_songs(3)
         words = (*STORE, "--format", "labels", *names)
         self.run_tavo(*words)
         for path in self.folder.glob("x.db*"):
             path.unlink()
         self.put("song 1.wav.labels.txt", b"of somebody else\n")
-        for stored, known in ((2, 0), (0, 2)):  # song 1 is not stored as failed, so it is analysed again
+        for stored, known in ((2, 0), (0, 2)):  # the failure of song 1 is not stored
             self.run_tavo(*words, status=1, said=b"song 1.wav: The file song 1.wav.labels.txt exists already")
             self.assertEqual([row["status"] for row in self.rows().values()], ["ok"] * 2)
         self.run_tavo(*words, "--force", said=b"1 stored, 2 known")
 
     def test_a_store_of_the_first_version(self):
-        """An older store lacks offset_ms and decoder. Some rows are damaged too."""
+        """An older store has no columns offset_ms and decoder. Here some rows are damaged, too."""
         self.put("a.wav")
         self.put("bad.wav", content=b"RIFF" + bytes(60))
         self.run_tavo(*STORE, "a.wav", "bad.wav", status=1)
@@ -152,7 +152,7 @@ class Store(Case):
         self.assertEqual(self.objects(done.stdout)[0]["beats_ms"], expected["beats_ms"])
         sentence = self.rows()[b"bad.wav"]["sentence"]
         self.run_tavo(*STORE, "--from-store", "--failed", printed=f"bad.wav: {sentence}\n".encode())
-        self.run_tavo(*STORE, "a.wav", said=b"1 known")  # this upgrades the table
+        self.run_tavo(*STORE, "a.wav", said=b"1 known")  # upgrades the table
         with sqlite3.connect(self.folder / "x.db") as db:
             self.assertEqual(db.execute("SELECT count(offset_ms), count(decoder) FROM songs").fetchone(), (0, 0))
             db.execute("PRAGMA user_version = 99")

@@ -1,4 +1,4 @@
-"""Tests parallel workers: killed workers, stops, and readers that close the output."""
+"""Tests parallel workers that are killed or stopped, and readers that close the output."""
 import contextlib
 import math
 import os
@@ -17,7 +17,7 @@ def children(process):
 
 
 def open_files(pid):
-    """Yields descriptor and target of each open file of a process."""
+    """Yields the descriptor and the target of each file that a process has open."""
     for entry in Path(f"/proc/{pid}/fd").glob("*"):
         with contextlib.suppress(OSError):
             yield int(entry.name), os.readlink(entry)
@@ -27,7 +27,7 @@ class Workers(Case):
     def setUp(self):
         super().setUp()
         self.put("a.wav")
-        # Ten minutes of constant samples: only the time of the analysis matters.
+        # The samples are constant, because only the time of the analysis matters.
         self.put("long.wav", wav(seconds=600, rate=48000, channels=2))
         os.link(self.folder / "long.wav", self.folder / "other.wav")
 
@@ -35,7 +35,7 @@ class Workers(Case):
         return super().start("--format", form, *arguments, **options)
 
     def worker_with(self, process, name):
-        """Waits until a worker has the file open. Returns its pid."""
+        """Waits until a worker has opened the file. Returns the worker's pid."""
         def find():
             self.assertIsNone(process.poll(), "the command ended before its time")
             return [pid for pid in children(process) if str(self.folder / name) in dict(open_files(pid)).values()]
@@ -44,11 +44,11 @@ class Workers(Case):
     def assert_results(self, text, *expected):
         self.assertEqual([(r["file"], r["status"]) for r in self.objects(text)], [*expected])
 
-    def test_as_single_runs_in_input_order(self):
+    def test_results_are_those_of_single_runs_in_input_order(self):
         names = [f"{i}.wav" for i in range(10)]
         for i, name in enumerate(names):
             self.put(name, source=short_song(i) if i % 4 else song(seconds=40, seed=i))
-        self.put("5.wav", b"RIFF")  # the other files are still analysed
+        self.put("5.wav", b"RIFF")  # fails alone
         single = [self.run_json(name, status=int(name == "5.wav"))[0] for name in names]
         for jobs in ("2", "32"):
             self.assertEqual(self.run_json("-j", jobs, *names, status=1), single)
@@ -63,7 +63,7 @@ class Workers(Case):
                                 ("././a.wav", "ok"))
             self.assertIn("signal 9", self.objects(out)[1]["error"])
             self.assertIn(b"signal 9", err)
-        process = self.start("-")  # the end of an idle worker is reported, and no file fails
+        process = self.start("-")  # no file fails if an idle worker is killed
         send(process, b"a.wav\n")
         self.assert_results(process.stdout.readline(), ("a.wav", "ok"))
         os.kill(*children(process), signal.SIGKILL)
@@ -73,7 +73,7 @@ class Workers(Case):
         self.assertEqual(process.returncode, 1)
 
     def test_workers_end_with_the_command_and_share_no_sockets(self):
-        # A worker ends when the command's socket is closed, so no other worker may keep it open.
+        # A worker ends when the command's end of its socket is closed, so no other worker may hold that end.
         process = self.start("-j", "2", "long.wav", "other.wav")
         workers = [self.worker_with(process, name) for name in ("long.wav", "other.wav")]
         sockets = [[to for fd, to in open_files(pid) if fd > 2 and to.startswith("socket:")] for pid in workers]
@@ -85,7 +85,7 @@ class Workers(Case):
                 self.assertTrue(select.select([end], [], [], 60)[0], "the worker goes on")
 
     def test_a_stop_keeps_what_is_finished(self):
-        # kill signals one process, a terminal the group. Results that wait for long.wav are kept.
+        # A terminal signals the whole group, kill only one process. Results that wait for an earlier file are printed.
         for send, number, words, busy, finished in (
                 (os.kill, signal.SIGTERM, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
                 (os.killpg, signal.SIGINT, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
@@ -94,7 +94,7 @@ class Workers(Case):
             with self.subTest(words=words, send=send):
                 process = self.start(*words.split())
                 worker = first = self.worker_with(process, "long.wav")
-                if busy != "long.wav":  # stop it, so that it does not finish first
+                if busy != "long.wav":  # suspend it, so that the other file is the first to end
                     os.kill(first, signal.SIGSTOP)
                     worker = self.worker_with(process, busy)
                 send(process.pid, number)
@@ -107,8 +107,8 @@ class Workers(Case):
                 self.assertRegex(err, rb"stopped; %d of [134] files? done" % len(finished))
         self.assert_only("a.wav", "long.wav", "other.wav")
 
-    def test_a_worker_that_hangs(self):
-        """The worker is killed one second after a stop, or after --timeout. Its temporary file is removed."""
+    def test_hanging_worker_is_killed(self):
+        """A worker that hangs is killed one second after a stop, or after --timeout. Its temporary file is removed."""
         for words, number, sentence in (("", signal.SIGTERM, b"stopped; 0 of 1 file"),
                                         ("--timeout 1", None, b"long.wav: The analysis took more than 1 s")):
             process = self.start("--click", "c.wav", *words.split(), "long.wav")
@@ -123,8 +123,8 @@ class Workers(Case):
             self.assertFalse(os.path.exists(f"/proc/{worker}"))
             self.assert_only("a.wav", "long.wav", "other.wav")
 
-    def test_a_list_that_is_being_read(self):
-        """Both a stop and a closed output end the wait for the next name."""
+    def test_waiting_for_a_list_can_be_ended(self):
+        """A stop and a closed output both end the wait for the next name."""
         for end, status in ((lambda process: process.send_signal(signal.SIGINT), 128 + signal.SIGINT),
                             (lambda process: process.stdout.close(), 128 + signal.SIGPIPE)):
             process = self.start("-")
@@ -133,18 +133,18 @@ class Workers(Case):
             end(process)
             self.assertEqual(process.wait(timeout=60), status)
 
-    def test_a_reader_gone(self):
-        """The command ends without a message and with the status of a broken pipe."""
+    def test_closed_output_ends_the_command(self):
+        """If the output is closed, the command ends without a message and with the status of a broken pipe."""
         for words, form in ((["long.wav"] * 400, "json"), (["a.wav"], "csv")):  # CSV starts with a header
             process = self.start(*words, form=form)
             process.stdout.close()
-            _, err = process.communicate(timeout=60)  # all 400 files would take minutes
+            _, err = process.communicate(timeout=60)  # long before all files are analysed
             self.assertEqual((process.returncode, err), (128 + signal.SIGPIPE, b""))
 
     def test_progress_on_a_terminal_only(self):
         start = time.monotonic()
         self.assertEqual(self.run_tavo("-m", "highlight", *["long.wav"] * 8).stderr, b"")
-        count = 8 * math.ceil(4 / (time.monotonic() - start))  # 4 s, since the bar appears after the first file
+        count = 8 * math.ceil(4 / (time.monotonic() - start))  # enough files for about 4 s
         shown = {}
         for option in ("", "--quiet"):
             words = f"'{TAVO}' {option} -m highlight {count * 'long.wav '} >/dev/null"

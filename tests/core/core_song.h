@@ -1,4 +1,4 @@
-// The song of the tests in this folder: 100 s at 120 BPM, loud from 41 s to 80 s.
+// The song for the tests in this folder: 100 s at 120 BPM, loud from 41 s to 80 s.
 #ifndef TAVO_TESTS_CORE_CORE_SONG_H
 #define TAVO_TESTS_CORE_CORE_SONG_H
 
@@ -30,7 +30,7 @@ inline const file &whole() {
     return whole_song;
 }
 
-// Creates an instance of the song in each mode and passes it to the test, which releases it.
+// Creates an instance for the song in each mode and passes it to the test, which releases it.
 template <typename action>
 void for_each_mode(std::initializer_list<int32_t> modes, action test) {
     for (const int32_t mode : modes) {

@@ -25,15 +25,14 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     EXPECT_EQ(loudness != nullptr, mode != TAVO_MODE_BEATS);
     EXPECT_EQ(points, mode != TAVO_MODE_BEATS ? (100 - 6) / 2 + 1 : 0);
     EXPECT_TRUE(loudness == nullptr || loudness[45 / 2] > 2 * loudness[35 / 2]);
-    // Periods are whole hops; the nearest ones are 21 (123 BPM) and 22 (117 BPM).
-    EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);
+    EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);  // whole hops
     EXPECT_EQ(tavo_deinit(ctx), 0);
     EXPECT_STREQ(job::find_inconsistency(job::last, mode), nullptr);
     EXPECT_EQ(result.status, 0);
     return result;
 }
 
-// True if a drum hit is within two hops of a time in ms.
+// Returns true if there is a drum hit within two hops of the time.
 bool is_on_a_hit(float ms) {
     const std::vector<double> &hits = core_song::whole().song.hits;
     return std::any_of(hits.begin(), hits.end(), [ms](double hit) {
@@ -53,7 +52,7 @@ TEST(Jobs, BeatsFallOnTheDrums) {
     EXPECT_GE(on_hits * 10, result.beat_count * 9);
 }
 
-// Mode 2 finds the same beats as mode 1 in a file that starts at mode 2's highlight.
+// Mode 2 finds the beats that mode 1 finds in a file that starts at the highlight of mode 2.
 TEST(Jobs, BothFindsTheBeatsOfTheRestOfTheFile) {
     const job::result both = run(core_song::whole().path, TAVO_MODE_BOTH, 7);
     ASSERT_GT(both.hl_pos, 1000);
@@ -70,8 +69,8 @@ int32_t read_nothing(mtsrc_ctx *, int32_t, mtsrc_frame *) {
     return TAVO_ERR_READ;
 }
 
-// The modes with beats report a failed decoding or conversion, with any highlight that was found
-// before. In mode 0 tavo_has_audio reports it.
+// The modes with beats report a failed decoding or conversion, together with a highlight that was
+// found before it. In mode 0 only tavo_has_audio reports the failure.
 TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     for (const bool decodes : {false, true}) {
         for_each_mode(kModes, [decodes](int32_t mode, TAVO_CTX *ctx) {
@@ -93,8 +92,8 @@ TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     }
 }
 
-// Runs only the beat analysis, with an analysis signal stored in the instance. In mode 2 it shifts
-// the beats by the highlight start; without an onset context it reports a failure.
+// The beat analysis is called directly, for an analysis signal in the instance. In mode 2 it adds
+// the highlight's start to the beats. In mode 0, which has no onset context, it reports a failure.
 TEST(Jobs, BeatAnalysisAloneReportsInEveryMode) {
     const support::song song = support::make_song({11025, 1, 20.0, 120.0, 1, 0.0});
     std::vector<float> beats[3];

@@ -1,5 +1,4 @@
-// Helpers for tests of encoded files: the files made by tests/support/make_songs.sh, and media
-// sources that are read to their end.
+// Helpers for tests that read encoded files, which tests/support/make_songs.sh makes.
 #ifndef TAVO_TESTS_DESKTOP_CODEC_TEST_H
 #define TAVO_TESTS_DESKTOP_CODEC_TEST_H
 
@@ -22,21 +21,20 @@ using samples = std::vector<int16_t>;
 
 constexpr int64_t kUnits = 10'000'000;  // per second
 
-// Path of a file by its name: golden/NAME in the source tree, otherwise a song made for the tests.
+// Returns the path of a file: golden/NAME is in the source tree, NAME is made for the tests.
 inline std::string fixture(const std::string &name) {
     const bool golden = name.rfind("golden/", 0) == 0;
     return golden ? CODEC_GOLDEN + name.substr(6) : CODEC_FIXTURES "/" + name;
 }
 
-// Returns a file's contents. A missing or empty file fails the test.
+// Returns a file's contents. The test fails if the file is missing or empty.
 inline std::string load(const std::string &path) {
     const std::string contents = support::contents_of(path);
     EXPECT_FALSE(contents.empty()) << path;
     return contents;
 }
 
-// Writes contents to a file that only this program uses and that exists until it ends. Returns its
-// path.
+// Writes a file that exists until the program ends. Returns its path.
 inline std::string save(const std::string &name, const std::string &contents) {
     static std::map<std::string, support::temporary_file> saved;
     const std::string path = saved.try_emplace(name, name).first->second.path;
@@ -44,7 +42,7 @@ inline std::string save(const std::string &name, const std::string &contents) {
     return path;
 }
 
-// An open source. It is null if it could not be opened; then error has the reason.
+// A source for a file. It is null if the file cannot be opened; then `error` is the reason.
 struct open_source {
     mtsrc_ctx *source = nullptr;
     int32_t error = 0;
@@ -60,7 +58,7 @@ struct open_source {
     open_source &operator=(const open_source &) = delete;
 };
 
-// Reads up to `limit` samples from the source's position. Any failure code fails the test.
+// Reads at most `limit` samples from the current position. The test fails if a read fails.
 inline samples read(mtsrc_ctx *source, size_t limit = SIZE_MAX) {
     constexpr int32_t kRequest = 8192;  // bytes, as in a job
     samples all;
@@ -82,18 +80,18 @@ inline samples read_all(const std::string &path) {
     return file.source != nullptr ? read(file.source) : samples{};
 }
 
-// Expects equal samples and reports the index of the first difference.
+// Expects equal samples, and reports the index of the first difference.
 inline void expect_equal(const samples &got, const samples &expected) {
     ASSERT_EQ(got.size(), expected.size());
     const auto differs = std::mismatch(got.begin(), got.end(), expected.begin()).first;
     EXPECT_EQ(differs - got.begin(), static_cast<ptrdiff_t>(got.size())) << "the first to differ";
 }
 
-// Returns a callback record for direct calls of the codec library. path must outlive it.
+// Returns a callback record for direct calls of the codec library. `path` must outlive it.
 inline mtsrc_io io_for(const std::string &path) {
     mtsrc_io io = {};
     mtsrc_file_callbacks(&io);
-    io.path = const_cast<char *>(path.c_str());  // only read by open
+    io.path = const_cast<char *>(path.c_str());  // only open() uses it, without writing
     return io;
 }
 

@@ -6,8 +6,8 @@ namespace {
 
 using namespace std::string_literals;
 
-constexpr size_t kFormat = 12;  // offset of the format in a plain header
-constexpr size_t kData = 36;    // offset of the data
+constexpr size_t kFormat = 12;  // offset of the format chunk in a plain file
+constexpr size_t kData = 36;    // offset of the data chunk
 
 samples make_samples(size_t count) {
     samples pcm(count);
@@ -15,7 +15,7 @@ samples make_samples(size_t count) {
     return pcm;
 }
 
-// Returns the file with the number of `size` bytes at offset `at` replaced.
+// Returns the file with a number of `size` bytes replaced at offset `at`.
 std::string patch(std::string file, size_t at, uint64_t value, size_t size = 2) {
     return file.replace(at, size, reinterpret_cast<const char *>(&value), size);  // little-endian
 }
@@ -24,11 +24,12 @@ TEST(Wav, ReadsUnusualHeaders) {
     const samples pcm = make_samples(60000);
     const std::string file = support::wav_bytes(pcm, 44100, 2), data = file.substr(kData);
     const auto with_size = [&](uint64_t bytes) { return patch(file, kData + 4, bytes, 4); };
-    // 22 more bytes: 16 bits in use, no speakers, PCM.
+    // The 22 bytes of an extensible format: 16 valid bits, no speaker positions, PCM.
     const std::string extension = "\26\0\20\0\0\0\0\0\1\0\0\0\0\0\20\0\x80\0\0\xAA\0\x38\x9B\x71"s;
     const std::string plain = file.substr(0, kData);
     const std::string format = patch(patch(plain, kFormat + 8, 0xFFFE), kFormat + 4, 40);
-    // The bodies of odd length spell "data": a reader that ignores the padding finds a false chunk.
+    // Chunks of odd length. A reader that ignores the padding byte finds a false data chunk in
+    // them.
     const std::string odd = "LIST\15\0\0\0INFOdata\1\0\0\0\7\0JUNK\5\0\0\0ddddd\0"s;
     const struct {
         const char *name;
@@ -61,29 +62,26 @@ TEST(Wav, ReadsUnusualHeaders) {
     }
 }
 
-// With a readable header, the code of an unusable format differs from that of unusable data.
-TEST(Wav, RefusesUnsupportedFormats) {
-    const std::string file = support::wav_bytes(make_samples(2000), 44100, 2);
-    const auto with_format = [&](uint64_t tag, uint64_t bits) {
-        return patch(patch(file, kFormat + 8, tag), kFormat + 22, bits);
-    };
-    const struct {
-        std::string contents;
-        int32_t error;
-    } refusals[] = {
-        {with_format(1, 8), -3},
-        {with_format(1, 24), -3},
-        {with_format(3, 32), -3},    // float
-        {with_format(7, 8), -3},     // mu-law
-        {with_format(300, 16), -3},  // the interface's own code for linear PCM
-        {file.substr(0, kData), -7},
-        {patch(file, kFormat + 10, 0), -3},     // no channels
-        {patch(file, kFormat + 12, 0, 4), -3},  // no rate
-        {file.substr(0, kFormat + 20), -3},
-    };
-    for (const auto &each : refusals) {
-        EXPECT_EQ(open_source(save("refused.wav", each.contents)).error, each.error)
-            << &each - refusals;
+// Offsets in these sparse files exceed 31 and 32 bits. All samples of the last second are 1000. A
+// size that does not fit the header is stated as its largest number.
+TEST(Wav, ReadsTheEndOfLargeFiles) {
+    constexpr int64_t kRate = 48'000, kSecondBytes = kRate * 8 * 2;
+    const std::string last = support::wav_bytes(samples(kRate * 8, 1000), kRate, 8);
+    for (const int64_t gib : {2, 4}) {
+        const int64_t seconds = (gib << 30) / kSecondBytes + 2;
+        const auto size = std::min<int64_t>(seconds * kSecondBytes, UINT32_MAX);
+        const std::string path =
+            save("sparse.wav", patch(last.substr(0, kData + 8), kData + 4, uint64_t(size), 4));
+        std::fstream out(path, std::ios::in | std::ios::out | std::ios::binary);
+        out.seekp(kData + 8 + (seconds - 1) * kSecondBytes) << last.substr(kData + 8);
+        ASSERT_TRUE(out.flush().good());
+        const open_source file(path);
+        ASSERT_NE(file.source, nullptr) << file.error;
+        EXPECT_EQ(file.format.duration, seconds * kUnits);
+        int64_t reached = -1;
+        ASSERT_EQ(mtsrc_seekstream(file.source, (seconds - 1) * kUnits, &reached), 0);
+        EXPECT_EQ(reached, (seconds - 1) * kUnits);
+        EXPECT_EQ(read(file.source), samples(kRate, 1000));
     }
 }
 

@@ -1,4 +1,4 @@
-// Peaks, searches, sorts and statistics on known lists. fuzz/toolkit.cpp tests random ones.
+// Peaks, searches, sorts and statistics of known lists. fuzz/toolkit.cpp tests random ones.
 #include <gtest/gtest.h>
 #include <pthread.h>
 
@@ -17,7 +17,7 @@ using list = std::vector<double>;
 
 }  // namespace
 
-// Comparing every pair of peaks would exceed the time limit.
+// A search that compares every pair of peaks would exceed the test's time limit.
 TEST(Peaks, AreSuppressedInLinearTime) {
     list x(500001);
     for (size_t i = 1; i < x.size(); i += 2) x[i] = 1.0 + static_cast<double>(i * 7919 % 500000);
@@ -32,7 +32,7 @@ TEST(Peaks, SearchReturnsTheNearestOrTheFirstEqual) {
     const struct {
         int32_t target, n, expected;
     } cases[] = {{100, 3, 2}, {100, 2, 1}, {100, 1, 0}, {100, 0, 0},
-                 {15, 3, 0},  {16, 3, 1},  {-5, 3, 0}};  // the lower of two equally near ones
+                 {15, 3, 0},  {16, 3, 1},  {-5, 3, 0}};  // 15: the first of two equally near ones
     for (const auto &c : cases) {
         EXPECT_EQ(findNearestIndex(ascending.data(), c.target, c.n), c.expected) << c.target;
     }
@@ -42,7 +42,7 @@ TEST(Peaks, SearchReturnsTheNearestOrTheFirstEqual) {
     EXPECT_EQ(findIndex(x.data(), 2, 4.0), 0);
 }
 
-// Equal, falling and rising values split off one element at a time.
+// Equal, falling and rising values are the worst input: each partition splits off one element.
 TEST(Sort, RecursionIsShallowOnTheWorstInput) {
     pthread_attr_t small;
     pthread_attr_init(&small);
@@ -63,7 +63,7 @@ TEST(Sort, RecursionIsShallowOnTheWorstInput) {
     pthread_attr_destroy(&small);
 }
 
-// Above 2^24 floats are even; near 5.6 million they are multiples of 0.5.
+// The single-precision sum of `large` is rounded to an even number.
 TEST(Stats, PopulationDeviationInBothPrecisions) {
     const double x[] = {2, 4, 4, 4, 5, 5, 7, 9};
     const float single[] = {2, 4, 4, 4, 5, 5, 7, 9}, large[] = {16777216, 1, 1};

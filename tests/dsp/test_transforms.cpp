@@ -1,4 +1,4 @@
-// The FFT, the transforms of any size, the mel scale and the matrix product on known values.
+// The FFT, the transforms of any size and the mel scale of known values.
 // fuzz/toolkit.cpp tests random ones.
 #include <gtest/gtest.h>
 
@@ -10,7 +10,6 @@
 
 #include "dsp/dft.h"
 #include "dsp/fft.h"
-#include "dsp/matrix.h"
 #include "dsp/mel.h"
 
 namespace {
@@ -18,9 +17,8 @@ namespace {
 using list = std::vector<double>;
 
 constexpr double kInf = std::numeric_limits<double>::infinity();
-constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
-// A plain transform that computes one butterfly after the other, stage by stage.
+// A plain FFT that computes one butterfly after the other, stage by stage.
 void transform_by_stages(list &re, list &im, const TAVO_FFT_CTX &ctx) {
     const size_t size = re.size();
     for (size_t i = 0; i < size; ++i) {
@@ -78,26 +76,7 @@ TEST(Fft, RefusesSizesOtherThanPowersOfTwo) {
     EXPECT_EQ(bit_reverse2(32, 5), 0u);
 }
 
-// Tests a tempo excerpt's sizes, too long for the fuzzer. Values that must not be read are NaN.
-TEST(Dft, TransformsTwoPulsesAndBack) {
-    constexpr size_t kSize = 4096;
-    list re(2584), im(kSize, kNan);
-    re[20] = 1.0;
-    re[2583] = 0.5;
-    re.resize(kSize, kNan);
-    ASSERT_EQ(tavo_dft(re.data(), im.data(), kSize, 2584, 1), 0);
-    for (size_t k = 0; k < kSize; ++k) {
-        const auto angle = [=](size_t at) { return 2.0 * M_PI * double(at * k % kSize) / kSize; };
-        EXPECT_NEAR(re[k], cos(angle(20)) + 0.5 * cos(angle(2583)), 1e-12) << k;
-        EXPECT_NEAR(im[k], -sin(angle(20)) - 0.5 * sin(angle(2583)), 1e-12) << k;
-    }
-    const list before = re;
-    ASSERT_EQ(tavo_inverse_dft(re.data(), im.data(), kSize, 86, 0), 0);
-    for (size_t t = 0; t < 86; ++t) EXPECT_NEAR(re[t], t == 20 ? 1.0 : 0.0, 1e-12) << t;
-    EXPECT_EQ(re[86], before[86]);
-}
-
-// cos(2 pi 3 k / 8) at k = 0, 1, 3, 4.
+// The output for an infinite input is infinite too, with the sign of the cosine.
 TEST(Dft, InfinityKeepsItsSign) {
     list re = {0, 0, 0, kInf, 0, 0, 0, 0}, im(8);
     tavo_dft(re.data(), im.data(), 8, 4, 1);
@@ -117,33 +96,17 @@ TEST(Dft, RefusesLengthsOutsideTheRange) {
 }
 
 TEST(Mel, ConvertsBothWays) {
-    const std::pair<float, float> cases[] = {
-        {0.0f, 0.0f},          {500.0f, 7.499996f},   {999.9f, 14.998492f},  {1000.0f, 15.0f},
-        {2000.0f, 25.077812f}, {5512.0f, 39.817379f}, {11025.0f, 49.896507f}};
-    for (const auto &[hz, mel] : cases) EXPECT_FLOAT_EQ(Hz2Mel(hz), mel);
-    const std::pair<float, float> back[] = {
-        {7.5f, 500.00027f}, {15.0f, 1000.0f}, {20.0f, 1410.4342f}, {39.8174f, 5512.0093f}};
-    for (const auto &[mel, hz] : back) EXPECT_FLOAT_EQ(Mel2Hz(mel), hz);
-    // If the logarithm or the exponential were not rounded, the results would be the neighbouring
-    // floats.
+    for (const auto &[hz, mel] : {std::pair{0.0f, 0.0f},
+                                  {500.0f, 7.499996f},
+                                  {999.9f, 14.998492f},
+                                  {1000.0f, 15.0f},
+                                  {11025.0f, 49.896507f}})
+        EXPECT_FLOAT_EQ(Hz2Mel(hz), mel);
+    for (const auto &[mel, hz] :
+         {std::pair{7.5f, 500.00027f}, {15.0f, 1000.0f}, {20.0f, 1410.4342f}})
+        EXPECT_FLOAT_EQ(Mel2Hz(mel), hz);
+    // The logarithm and the exponential are rounded to single precision.
     EXPECT_EQ(Hz2Mel(2333.0f), 27.3169632f);
     EXPECT_EQ(Hz2Mel(2703.0f), 29.457243f);
     EXPECT_EQ(Mel2Hz(17.85f), 1216.55334f);
-    EXPECT_EQ(Mel2Hz(Hz2Mel(5512.0f)), 5512.0005f);
-}
-
-// A row with a zero weight is not read. A zero factor skips its term, even against infinity.
-TEST(Matrix, SkipsZeroFactors) {
-    const auto infinity = static_cast<float>(kInf);
-    const float a0[] = {0.0f, 2.0f, infinity}, b1[] = {1.0f, infinity}, b2[] = {0.0f, 1.0f};
-    const float *a[] = {a0}, *b[] = {nullptr, b1, b2};
-    double d0[2] = {7.0, 7.0};
-    double *d[] = {d0};
-    EXPECT_EQ(MultiplyMtxs(1, 0, 3, nullptr, nullptr, d), 1);
-    EXPECT_EQ(MultiplyMtxs(0, 2, 3, nullptr, nullptr, d), 0);
-    EXPECT_EQ(d0[0], 7.0);
-    EXPECT_EQ(MultiplyMtxs(1, 2, 3, a, b, d), 1);
-    EXPECT_TRUE(d0[0] == 2.0 && d0[1] == kInf);
-    EXPECT_EQ(MultiplyMtxs(1, 2, 0, nullptr, nullptr, d), 1);
-    EXPECT_TRUE(d0[0] == 0.0 && d0[1] == 0.0);
 }

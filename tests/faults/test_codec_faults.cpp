@@ -1,18 +1,15 @@
-// Replaces every value that the codec library returns, in one call or in all calls from one on, and
-// runs a job in every mode. The file is refused or the job reports once; nothing leaks or hangs.
+// Runs jobs with a codec library that returns wrong values, once or from some call on. Either the
+// file is refused or the job reports once. Nothing leaks or hangs.
 #include <sys/resource.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <csignal>
-#include <cstring>
 #include <map>
 
 #include "tests/media_source/source_case.h"
 #include "tests/support/job_harness.h"
 #include "tests/support/song.h"
 
-// An allocation that exceeds the memory fails instead of ending the program.
+// A sanitizer must let an allocation that exceeds the memory fail instead of ending the program.
 extern "C" const char *__asan_default_options() {
     return "allocator_may_return_null=1:max_allocation_size_mb=512";
 }
@@ -25,10 +22,11 @@ namespace {
 constexpr unsigned kMaxSeconds = 30;  // of one job
 constexpr long kMaxMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
-// A quick run tests kCalls calls of each value, and in each call only every kStep-th replacement.
+// Unless TAVO_FAULTS is set, kCalls calls that return a value are wrong, with every kStep-th of its
+// replacements.
 constexpr int kCalls = 2, kStep = 31;
 
-// Replacements for a value: those near its own limits, and general ones.
+// Returns wrong values: some near the limits of the named value, and some for any value.
 std::vector<int64_t> replacements_for(const std::string &value) {
     static std::map<std::string, std::vector<int64_t>> near_limits = {
         {"bytes", {16'384, 16'385, 131'071, 1'048'576, 1'048'577}},
@@ -47,11 +45,10 @@ std::vector<int64_t> replacements_for(const std::string &value) {
 
 using value_id = std::pair<std::string, std::string>;  // function and value
 
-// The fault of the current run. It is used with the fake library's lock held; between runs no other
-// thread exists.
+// The fault of the current run. The fake library's lock guards it.
 struct fault {
     value_id id = {};
-    int64_t call = -1;  // index of the first wrong call
+    int64_t call = -1;  // index of the wrong call
     int64_t replacement = 0;
     bool persistent = false;  // all later calls are wrong too
     bool applied = false;
@@ -68,8 +65,7 @@ int64_t apply_fault(const std::string &function, const std::string &value, int64
     return now.replacement;
 }
 
-// The song's PCM as frames, each with its start time. The stated duration is longer than the song,
-// so that jobs reach the end of the stream.
+// Returns a stream of the song. Its duration is stated too long, so that jobs read to the end.
 fake_codec::stream_spec stream_of(const support::song &song) {
     fake_codec::stream_spec stream;
     stream.sample_rate = song.plan.rate;
@@ -84,8 +80,6 @@ fake_codec::stream_spec stream_of(const support::song &song) {
     }
     return stream;
 }
-
-char current_run[256];  // printed if the run hangs
 
 class CodecFaults : public testing::TestWithParam<std::string> {
  protected:
@@ -112,12 +106,12 @@ class CodecFaults : public testing::TestWithParam<std::string> {
             for (const bool persistent : {false, true}) {
                 if (all == nullptr && tried++ % kStep != 0) continue;
                 current_fault = {id, call, replacement, persistent};
-                snprintf(current_run, sizeof current_run,
+                snprintf(job::current_run, sizeof job::current_run,
                          "%s %s %s=%lld at call %lld%s in mode %d\n", GetParam().c_str(),
                          id.first.c_str(), id.second.c_str(), static_cast<long long>(replacement),
                          static_cast<long long>(call), persistent ? " and later" : "", mode);
                 alarm(kMaxSeconds);
-                EXPECT_TRUE(run(mode)) << current_run;
+                EXPECT_TRUE(run(mode)) << job::current_run;
                 applied += current_fault.applied ? 1 : 0;
             }
         }
@@ -129,19 +123,16 @@ class CodecFaults : public testing::TestWithParam<std::string> {
 };
 
 TEST_P(CodecFaults, JobIsRefusedOrReportsOnce) {
-    const int32_t channels = GetParam() == "ogg" ? 1 : 2;  // of the decoder's output
+    const int32_t channels = GetParam() == "ogg" ? 1 : 2;  // Vorbis is decoded to mono
     stream = stream_of(support::make_song({8000, channels, 15.5, 120.0, 1, 6.0, 15.0}));
     const source_row &row = row_of(GetParam());
     if (row.tag != 0) stream.codec = row.tag;
     std::ofstream(file.path) << row.file;
-    signal(SIGALRM, [](int) {
-        (void)!write(STDERR_FILENO, current_run, strlen(current_run));
-        _exit(3);
-    });
+    job::report_interruptions();
     for (const int32_t mode : {TAVO_MODE_HIGHLIGHT, TAVO_MODE_BEATS, TAVO_MODE_BOTH}) {
         current_fault = fault{};
         ASSERT_TRUE(run(mode) && job::last.status == 0) << mode;
-        EXPECT_EQ(job::last.hl_pos > 1000, mode != TAVO_MODE_BEATS);  // so that mode 2 seeks
+        EXPECT_EQ(job::last.hl_pos > 1000, mode != TAVO_MODE_BEATS);  // late enough for a seek
         const std::map<value_id, int64_t> calls = current_fault.calls;
         for (const auto &[id, count] : calls) {
             const int64_t step = std::max<int64_t>(1, count / kCalls);
@@ -152,7 +143,7 @@ TEST_P(CodecFaults, JobIsRefusedOrReportsOnce) {
     EXPECT_GT(applied, 50);
     rusage used = {};
     getrusage(RUSAGE_SELF, &used);
-    // Sanitizers also use memory that is only reserved.
+    // Sanitizers need more memory.
     EXPECT_TRUE(CODEC_FAULTS_SANITIZED || used.ru_maxrss / 1024 < kMaxMib) << used.ru_maxrss;
 }
 

@@ -1,12 +1,11 @@
-// Makes every call of a memory, thread, lock or file function fail, alone or with all later ones.
-// Nothing crashes, hangs or leaks, and each job calls back once. TAVO_FAULTS=all tries every call.
+// Runs jobs in which a call of a memory, thread, lock or file function fails, alone or with all
+// later ones. Nothing crashes, hangs or leaks, and each job calls back once. TAVO_FAULTS=all tries
+// every call.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <csignal>
-#include <cstring>
 
 #include "tests/support/bytes.h"
 #include "tests/support/fault_layer.h"
@@ -14,7 +13,7 @@
 
 namespace {
 
-// Functions that fail together. harmless: the result is the same as without the failures.
+// Functions that fail together. Harmless failures do not change the result of a job.
 struct group {
     const char *name;
     uint32_t calls;
@@ -39,18 +38,11 @@ constexpr int kOpenedOnly = -1;
 // The outcome of a run.
 struct outcome {
     int32_t created = 99, started = 0, released = 0, state = 0, complete = 0;
-    int64_t counted = 0, failed = 0;  // counted calls and failed calls
-    int64_t failed_early = 0;         // failed calls before the job
+    int64_t counted = 0, failed = 0;  // number of counted calls and of failed ones
+    int64_t failed_early = 0;         // number of failed calls before the job
     double song_ms = 0.0;
     job::result result;
 };
-
-char current_run[256];  // printed if the run crashes or hangs
-
-void report_interruption(int) {
-    (void)!write(STDERR_FILENO, current_run, strlen(current_run));
-    _exit(3);
-}
 
 int64_t count_descriptors() {
     const std::filesystem::directory_iterator entries("/proc/self/fd");
@@ -81,7 +73,7 @@ outcome run(const std::string &path, int mode, const fault::plan &plan) {
     return out;
 }
 
-// Returns null if all promises hold, otherwise the broken one.
+// Returns null if all promises hold, otherwise the name of a broken one.
 const char *find_broken_promise(const outcome &found, int mode, const group &kind,
                                 const fault::plan &plan, const outcome &undisturbed) {
     if (found.created != 0) {
@@ -111,8 +103,8 @@ const char *find_broken_promise(const outcome &found, int mode, const group &kin
     return in_song ? job::find_inconsistency(a, mode) : "beats outside the song";
 }
 
-// Makes count calls of the job fail, one at a time and evenly spread; or every call if there are
-// fewer.
+// Runs the job `count` times, each time with another failing call. The failing calls are evenly
+// spread.
 void try_calls(const std::string &path, int mode, const group &kind, int64_t count) {
     fault::plan plan = {kind.calls, INT64_MAX, false, kind.error};
     const outcome undisturbed = run(path, mode, plan);
@@ -126,15 +118,15 @@ void try_calls(const std::string &path, int mode, const group &kind, int64_t cou
     for (plan.index = 0; plan.index < undisturbed.counted; plan.index += step) {
         for (const bool forever : {false, true}) {
             plan.forever = forever && kind.error != EINTR;
-            snprintf(current_run, sizeof current_run, "interrupted: %s, mode %d, %s %d%s\n",
-                     path.c_str(), mode, kind.name, static_cast<int>(plan.index),
-                     plan.forever ? " and on" : "");
+            snprintf(job::current_run, sizeof job::current_run,
+                     "interrupted: %s, mode %d, %s %d%s\n", path.c_str(), mode, kind.name,
+                     static_cast<int>(plan.index), plan.forever ? " and on" : "");
             const int64_t before = count_descriptors();
             const outcome found = run(path, mode, plan);
             applied += found.failed > 0 ? 1 : 0;
             const char *broken = find_broken_promise(found, mode, kind, plan, undisturbed);
-            EXPECT_EQ(broken, nullptr) << broken << "; " << current_run;
-            EXPECT_EQ(count_descriptors(), before) << current_run;
+            EXPECT_EQ(broken, nullptr) << broken << "; " << job::current_run;
+            EXPECT_EQ(count_descriptors(), before) << job::current_run;
         }
     }
     EXPECT_GT(applied, 0) << path << ' ' << kind.name;
@@ -142,9 +134,7 @@ void try_calls(const std::string &path, int mode, const group &kind, int64_t cou
 
 class Faults : public testing::TestWithParam<std::tuple<const char *, int>> {
  protected:
-    void SetUp() override {
-        for (const int number : {SIGALRM, SIGSEGV, SIGABRT}) signal(number, report_interruption);
-    }
+    void SetUp() override { job::report_interruptions(); }
     const std::string format = std::get<0>(GetParam());
     const int mode = std::get<1>(GetParam());
     const int64_t count = format == "wav" && EVERY_CALL ? INT64_MAX : FAULT_SAMPLE;
@@ -159,16 +149,16 @@ TEST_P(Faults, JobReportsOnceOrIsRefused) {
     }
 }
 
-// The thread sanitizer slows down the other formats most, and their jobs have no other threads.
+// Under the thread sanitizer the other formats are slow, and their jobs start no other threads.
 const auto kFormats =
     EVERY_CALL ? std::vector{"wav", "mp3", "m4a", "flac", "aac", "ogg"} : std::vector{"wav", "mp3"};
 INSTANTIATE_TEST_SUITE_P(Jobs, Faults,
                          testing::Combine(testing::ValuesIn(kFormats),
                                           testing::Values(kOpenedOnly, 0, 1, 2)));
 
-// A path that names a descriptor, which every source duplicates. Duplicates share one offset, so
-// the song must be short enough to be decoded by one source.
-TEST(DuplicateFaults, OfDuplicatedDescriptorsAreReported) {
+// The path "fd" names a descriptor, which each source duplicates. The duplicates share their
+// offset, so this song is short enough for a single source.
+TEST(DuplicateFaults, AreReported) {
     const int input = dup(STDIN_FILENO);
     const int file = open(SHORT_SONGS "/brief.flac", O_RDONLY);
     ASSERT_EQ(dup2(file, STDIN_FILENO), STDIN_FILENO);

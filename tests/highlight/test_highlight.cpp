@@ -1,5 +1,5 @@
-// Curves and PCM of constant levels, written as pairs of a count and a value. The largest point of
-// each curve (2 s per point) is 1, so the values are normalised.
+// Strings describe curves (2 s per point) and PCM as pairs of a count and a value. The largest
+// value of each curve is 1, so the search does not need to scale it.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -19,7 +19,7 @@
 
 namespace {
 
-// Returns 10 log10(mean square + 1) of `window` samples, with full scale 1.
+// Returns the level of `window` samples: 10 log10(mean square + 1), where full scale is 1.
 float plain_power(const int16_t *pcm, int64_t window) {
     double sum = 0.0;
     for (int64_t i = 0; i < window; ++i) sum += (pcm[i] / 32767.0) * (pcm[i] / 32767.0);
@@ -39,8 +39,8 @@ std::vector<float> expand(const std::string &pairs) {
     return power;
 }
 
-// Returns PCM with alternating signs and `unit` samples per point. Each value is approximately the
-// mean square, with full scale 1.
+// Returns PCM of alternating signs, `unit` samples per point. A value is the mean square, where
+// full scale is 1.
 std::vector<int16_t> make_pcm(const std::string &pairs, int64_t unit) {
     std::vector<int16_t> pcm;
     for (const float square : expand(pairs)) {
@@ -68,7 +68,7 @@ uint32_t search(const std::string &curve, int32_t duration_s, int32_t hl_param =
     return _get_HL_simple(&hl, duration_s);
 }
 
-// Returns the valleys of 50 points, which have the value `depth` at `dips` and 1 elsewhere.
+// Returns the valleys of a curve of 50 points, which is `depth` at the dips and 1 elsewhere.
 indexes find_valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f,
                      float std = 0.125f) {
     std::vector<float> values(50, 1.0f);
@@ -79,7 +79,7 @@ indexes find_valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f,
     return out;
 }
 
-// Returns the tuned start of PCM in steps of 0.4 s, the first 3 s before the coarse start.
+// Returns the tuned start. The PCM has 0.4 s per point and begins 3 s before the coarse start.
 uint32_t tune(const std::string &steps, int32_t rate = kRate, uint32_t start_ms = 3000,
               uint32_t duration_s = 60) {
     std::vector<int16_t> pcm = make_pcm(steps, rate * 2 / 5);
@@ -87,8 +87,8 @@ uint32_t tune(const std::string &steps, int32_t rate = kRate, uint32_t start_ms 
     return _tune_HL_simple(pcm.data(), rate, start_ms, duration_s);
 }
 
-// Returns the start found in a song whose buffer ends with the PCM. A second search replaces the
-// curve.
+// Returns the start found in a song. A second search replaces the curve of the first and finds the
+// same start.
 uint32_t find_position(std::vector<int16_t> pcm, int64_t duration_s, int32_t count) {
     pcm.shrink_to_fit();
     TAVO_CTX ctx = {};
@@ -121,14 +121,7 @@ TEST(PowerEnvelope, HasOneValueEveryTwoSeconds) {
     EXPECT_EQ(hl.power, nullptr);
 }
 
-// Tests a song at full power, and a window of equal parts of silence, quarter and full power.
-TEST(PowerEnvelope, IsTenLogOfMeanSquarePlusOne) {
-    EXPECT_EQ(compute_curve(make_pcm("800 1", 1)), std::vector<float>(2, 10.0f * log10f(2.0f)));
-    EXPECT_NEAR(compute_curve(make_pcm("1 0 1 .25 1 1", 200))[0], 10.0 * log10(1.0 + 1.25 / 3.0),
-                1e-4);
-}
-
-// With odd and even numbers of windows, the two sections share one window or none.
+// The curve is computed in two halves. If the number of windows is odd, they share one.
 TEST(PowerEnvelope, EqualsEachWindowSummedSeparately) {
     std::mt19937 random(11);
     for (int64_t windows = 1; windows <= 9; ++windows) {
@@ -146,8 +139,8 @@ TEST(PowerEnvelope, EqualsEachWindowSummedSeparately) {
     }
 }
 
-// If the mean is above 0.5, a dip must be 1.5 deviations below it, otherwise one: below 0.375 in
-// both cases.
+// Points count as low if they are a deviation below the mean, or 1.5 deviations if the mean exceeds
+// 0.5. A valley is the last point of a low stretch.
 TEST(Valleys, AreTheEndsOfQuietStretches) {
     EXPECT_EQ(find_valleys({5}, 0.375f, 0.75f, 0.25f), indexes{});
     EXPECT_EQ(find_valleys({5}, 0.34375f, 0.75f, 0.25f), indexes{5});
@@ -162,62 +155,56 @@ TEST(Valleys, AreTheEndsOfQuietStretches) {
     EXPECT_EQ(find_valleys(many), indexes(many.begin(), many.begin() + 15));
 }
 
-// In songs of 90 s and more, edges count from point 9 on and are scored up to 25 points before the
-// end; in shorter songs from 0 on and up to 10.
+// Edges are steep rises. Those in the first 18 s and the last 50 s of a song do not count. In a
+// song of less than 90 s, only those in the last 20 s do not count.
 TEST(Search, ReturnsTheBestEdge) {
     const struct {
         const char *curve;
         int32_t duration_s;
         uint32_t ms;
     } cases[] = {
-        {"20 0.4 10 0.9 1 1 19 0.9 10 0.4", 120, 38000},  // into the loud passage
-        // The edge at 28 has a smaller step than the edge at 14, but its average rises more, so its
-        // score is higher.
+        {"20 0.4 10 0.9 1 1 19 0.9 10 0.4", 120, 38000},
+        // A smaller step wins if the average around it rises more.
         {"3 0.1 1 1 11 0.1 6 0.45 7 0.1 1 0.35 12 0.65 19 0.1", 120, 56000},
-        // The edges at 13 and 30 have equal scores, so the one with the larger step wins.
+        // Of two edges with equal scores the larger step wins.
         {"3 0.125 1 1 9 0.125 1 0.375 7 0.8125 10 0.25 10 0.75 19 0.25", 120, 60000},
-        // The step from 0.6 to 0.9 is not scored, because the average falls from 0.8 to 0.75. The
-        // answer is the point after the only edge. With equal averages of 0.75 the step is scored.
+        // An edge is not scored if the average falls there. Without a scored edge the answer is the
+        // point after the first one.
         {"5 0.25 10 1 1 0.6 1 0.9 20 0.6 23 0.25", 120, 32000},
         {"5 0.25 10 1 1 0.5 1 0.875 20 0.625 23 0.25", 120, 30000},
-        // Four loud points after an edge are a passage, three are not, even if values at the mean
-        // of 0.25 follow, because they are not above it.
+        // An edge is scored if four loud points follow it. Loud points are above the mean.
         {"20 0.5 4 1 36 0.5", 120, 38000},
         {"20 0.5 3 1 37 0.5", 120, 40000},
         {"20 0 3 1 4 0.25 10 0 16 0.25 7 1", 120, 40000},
-        // The opening counts only in short songs.
+        // An edge near the start counts only in a short song.
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 90, 60000},
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 89, 8000},
-        // One edge, at 5, inside the loud passage that starts at 0; the later rise has no strict
-        // maximum. Without a segment the answer would be the point after the edge.
+        // The only edge is inside a passage, so the answer is the edge itself.
         {"6 0.75 24 1 11 0.25 1 0.5 1 0.75 8 0.875 9 0.25", 80, 10000},
-        // At the last scored point the answer is the edge itself. One point later it is the point
-        // after the edge, because no other edge qualifies; but an earlier edge does.
+        // The first row has the latest edge that counts. In the second one the edge is too late,
+        // and in the third one an earlier edge is chosen.
         {"36 0.25 10 1 14 0.25", 90, 70000},
         {"37 0.25 10 1 13 0.25", 90, 74000},
         {"20 0.25 1 0.9 14 0.25 1 1 24 0.25", 90, 40000},
         {"51 0.25 5 1 4 0.25", 89, 100000},
         {"52 0.25 5 1 3 0.25", 89, 104000},
-        // Bursts of two points are too short to be scored, so the answer is the point after the
-        // first edge that is not followed closely by a valley. Dips below 0.336 are low points, and
-        // the valley is the last of them: at 23, 3 after the edge at 20, or at 24.
+        // No edge is scored, so the answer is the first edge that no valley follows closely.
         {"20 0.5 1 1 1 0.9 1 0.3 1 0.1 1 0.4 5 0.5 2 0.85 28 0.5", 120, 60000},
         {"20 0.5 1 1 1 0.9 1 0.5 1 0.3 1 0.1 1 0.4 4 0.5 2 0.85 28 0.5", 120, 40000},
-        // An edge must rise above the 60th percentile, which is 0.8. The largest step, at 29, only
-        // reaches it, and the next one, at 41, exceeds it.
+        // An edge must exceed the 60th percentile of the curve, which the largest step only
+        // reaches.
         {"9 1 20 0.5 1 0.1 1 0.8 10 0.5 1 0.2 1 0.81 28 0.5 29 1", 204, 84000},
         {"30 1 30 0.5", 120, 0},  // no rising edge
         {"60 0", 120, 0},
-        // Nine points are skipped, and the remaining four are too few. With one point more there
-        // are enough, but the only edge, at 11, is not scored.
+        // After the opening there must be at least five points.
         {"11 0.25 2 1", 100, 0},
         {"12 0.25 2 1", 100, 24000},
     };
     for (const auto &c : cases) EXPECT_EQ(search(c.curve, c.duration_s), c.ms) << c.curve;
 }
 
-// Only the ten largest edges count: with nine bursts before a passage the passage wins, with ten
-// the first burst. Of thirty passages the last one, which is the loudest, wins.
+// Only the ten largest edges count. The passage after nine bursts is found, but not after ten. Of
+// thirty passages the loudest, which is the last, is found.
 TEST(Search, ComparesTenEdgesAndThirtyPassages) {
     std::string bursts = "12 0.25", passages;
     for (int k = 0; k < 9; ++k) bursts += " 1 0." + std::to_string(99 - k) + " 4 0.25";
@@ -228,15 +215,14 @@ TEST(Search, ComparesTenEdgesAndThirtyPassages) {
 }
 
 TEST(Search, RequestedLengthMovesTheStart) {
-    // Segments (9, 13) and (29, 49), no valleys. The edge at 29 is chosen, and the region ends at
-    // 49, 20 points later.
+    // This curve has two loud passages. The second one, of 20 points, is chosen.
     const char *plain = "10 0.25 4 0.75 16 0.25 20 1 10 0.25";
-    // A region that would exceed the song starts at the first segment or the first valley,
+    // A region that would extend past the song starts at the first passage or at the first valley,
     // whichever is earlier. The dips to 0.1 are valleys.
     const char *valley_first = "20 0.5 1 0.1 9 0.5 20 1 5 0.5 1 0.1 4 0.5";
     const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
     const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
-    // A single loud point is not a segment, but two are: (19, 21). The region ends at 27.
+    // A passage consists of at least two loud points.
     const char *one = "20 0.5 1 1 39 0.5", *two = "20 0.5 2 1 38 0.5";
     const struct {
         const char *curve;
@@ -245,15 +231,15 @@ TEST(Search, RequestedLengthMovesTheStart) {
     } cases[] = {
         {plain, 0, 58000},
         {plain, -30, 58000},
-        {plain, 44, 58000},           // 22 points need a lead of 2, too short to move the start
-        {plain, 46, 58000},           // ideal start 26: 29 is the nearest boundary
-        {plain, 60, 26000},           // ideal start 19: 13 is the nearest boundary
-        {plain, 102, 18000},          // 9 + 51 reaches the end: the first segment
-        {plain, 104, 18000},          // 9 + 52 exceeds it: the first segment
-        {valley_first, 80, 40000},    // 20 + 40; the segment is at 29
-        {segment_first, 102, 18000},  // 9 + 51; the valley is at 39
-        {valley_only, 58, 62000},     // 31 + 29
-        {one, 30, 24000},             // 15 points, 8 of them before 20
+        {plain, 44, 58000},   // not long enough to move the start
+        {plain, 46, 58000},   // the nearest boundary is the same
+        {plain, 60, 26000},   // the nearest boundary is the end of the first passage
+        {plain, 102, 18000},  // as long as the song after the first passage
+        {plain, 104, 18000},
+        {valley_first, 80, 40000},
+        {segment_first, 102, 18000},
+        {valley_only, 58, 62000},
+        {one, 30, 24000},
         {one, 31, 24000},
         {two, 30, 38000},
     };
@@ -262,7 +248,7 @@ TEST(Search, RequestedLengthMovesTheStart) {
     }
 }
 
-// The mean is 0.5.
+// The ideal start is the requested length before the end of the region. The mean is 0.5.
 TEST(Region, EndsAtAValleyOrAFall) {
     const char *loud = "120 1", *hundred = "100 1", *dip = "50 1 1 .375 3 1 1 .25 65 1";
     const char *falls = "50 1 4 .375 1 1 1 .25 1 1 2 .375 1 1 1 .375 1 1 2 .375 56 1";
@@ -273,51 +259,42 @@ TEST(Region, EndsAtAValleyOrAFall) {
         uint32_t start;
         float std = 0.25f;
     } cases[] = {
-        {"the next valley is the end", loud, 40, 15, {34, 50}, {}, 34},
-        {"2 points back are not worth it", loud, 40, 12, {34, 50}, {}, 40},
-        {"34 is 3 off: the ideal start itself", loud, 40, 13, {34, 50}, {}, 37},
-        {"25 points on", loud, 40, 30, {65}, {}, 35},
-        {"26 are too far, and no end is found", loud, 40, 30, {66}, {}, 10},
-        // The ideal start is 35.
-        {"the valley before", loud, 40, 15, {37, 50}, {}, 37},
-        {"3 off", loud, 40, 15, {38, 50}, {}, 35},
-        {"at chosen itself: none before", loud, 40, 15, {34, 40, 50}, {}, 35},
-        {"back while nearer to 31", loud, 40, 19, {20, 30, 34, 39, 50}, {}, 30},
-        {"not the song's first point", loud, 6, 9, {0, 10}, {}, 1},
-        {"equally near: the valley", loud, 40, 15, {38, 50}, {32, 60}, 38},
-        {"a segment's boundary", loud, 40, 15, {38, 50}, {33, 60}, 33},
-        {"also as the last boundary", loud, 40, 15, {38, 50}, {20, 33}, 33},
-        {"which needs a valley", loud, 40, 15, {50}, {20, 33}, 35},
-        {"another follows", loud, 40, 15, {50}, {20, 33, 60, 70}, 33},
-        {"60 is farther", loud, 40, 15, {50}, {20, 60}, 20},
-        {"0 is no boundary", loud, 40, 15, {50}, {0, 90}, 35},
-        // Without a valley the end is searched from 14 s to 48 s after chosen: points 47 to 64.
-        {"a fall of one deviation ends it at 50", falls, 40, 15, {}, {}, 35},
-        {"reached at 50 exactly", falls, 40, 15, {}, {}, 35, 0.625f},
-        {"the deepest of the falls, 55", falls, 40, 20, {}, {}, 35, 0.875f},
-        {"a fall at 64", "64 1 4 .25 52 1", 40, 28, {}, {}, 36},
-        {"none at 65", "65 1 4 .25 51 1", 40, 28, {}, {}, 12},
-        {"50 is at the mean, 52 lowest", "50 1 1 .5 1 1 2 .375 66 1", 40, 15, {}, {}, 37},
-        {"no fall that lasts: the lowest, 54", dip, 40, 19, {}, {}, 35},
-        {"a segment around chosen: its end, 60", dip, 40, 25, {}, {30, 60}, 30},
-        {"40 is not inside (10, 40)", dip, 40, 19, {}, {10, 40, 60, 70}, 40},
-        {"46 is too early, 48 lowest", "46 1 1 .25 1 1 2 .25", 40, 15, {}, {}, 33},
-        {"nothing low: the last point, 49", "50 1", 40, 14, {}, {}, 35},
-        {"46 falls: its followers are there", "46 1 1 .25 1 1 2 .25", 39, 9, {}, {30, 45}, 39},
-        {"47 does not: the segment's end", "47 1 1 .25 1 1 1 .25", 40, 8, {}, {30, 45}, 30},
-        {"ends at 100 exactly", hundred, 90, 10, {98}, {30, 99}, 90},
-        {"too long: the earlier of 99 and 30", hundred, 90, 11, {99}, {30, 99}, 30},
-        {"no segment reads 0", hundred, 90, 11, {99}, {}, 0},
-        {"neither fits", hundred, 90, 11, {99}, {95, 99}, 0},
-        {"the valley is earlier", hundred, 98, 3, {20}, {30, 99}, 20},
+        {"a valley near the ideal start", loud, 40, 15, {37, 50}, {}, 37},
+        {"no valley near it", loud, 40, 13, {34, 50}, {}, 37},
+        {"a valley at the chosen point", loud, 40, 15, {34, 40, 50}, {}, 35},
+        {"a valley at the start of the song", loud, 6, 9, {0, 10}, {}, 1},
+        {"a segment as near as the valley", loud, 40, 15, {38, 50}, {32, 60}, 38},
+        {"a segment nearer than the valley", loud, 40, 15, {38, 50}, {33, 60}, 33},
+        {"the last segment, without a valley", loud, 40, 15, {50}, {20, 33}, 35},
+        {"a segment at the start of the song", loud, 40, 15, {50}, {0, 90}, 35},
+        {"the valley at the end is 25 points on", loud, 40, 30, {65}, {}, 35},
+        {"the valley at the end is too far", loud, 40, 30, {66}, {}, 10},
+        // Without a valley the end is searched from 14 s to 48 s after the chosen point.
+        {"a fall by exactly one deviation", falls, 40, 15, {}, {}, 35, 0.625f},
+        {"the deepest of smaller falls", falls, 40, 20, {}, {}, 35, 0.875f},
+        {"the latest fall", "64 1 4 .25 52 1", 40, 28, {}, {}, 36},
+        {"a fall that is too late", "65 1 4 .25 51 1", 40, 28, {}, {}, 12},
+        {"a fall to the mean", "50 1 1 .5 1 1 2 .375 66 1", 40, 15, {}, {}, 37},
+        {"no fall that lasts: the lowest point", dip, 40, 19, {}, {}, 35},
+        {"the segment around the chosen point", dip, 40, 25, {}, {10, 20, 30, 60}, 30},
+        {"a segment that ends at the chosen point", dip, 40, 19, {}, {10, 40, 60, 70}, 40},
+        {"a low point that is too early", "46 1 1 .25 1 1 2 .25", 40, 15, {}, {}, 33},
+        {"no low point: the last point", "50 1", 40, 14, {}, {}, 35},
+        {"a fall before the last three points", "46 1 1 .25 1 1 2 .25", 39, 9, {}, {30, 45}, 39},
+        {"a fall in the last three points", "47 1 1 .25 1 1 1 .25", 40, 8, {}, {30, 45}, 30},
+        // A region that extends past the song starts at the first valley or segment, or at 0.
+        {"a region that ends with the song", hundred, 90, 10, {98}, {30, 99}, 90},
+        {"too long, with an early segment", hundred, 90, 11, {99}, {30, 99}, 30},
+        {"too long, without a segment", hundred, 90, 11, {99}, {}, 0},
+        {"too long from every point", hundred, 90, 11, {99}, {95, 99}, 0},
         {"endless", hundred, 90, INT32_MAX, {}, {}, 0},
-        {"after the song", loud, 120, 15, {50}, {}, 0},
-        {"before it", loud, -1, 15, {50}, {}, 0},
+        {"chosen after the song", loud, 120, 15, {50}, {}, 0},
+        {"chosen before the song", loud, -1, 15, {50}, {}, 0},
     };
     for (const auto &c : cases) {
         std::vector<float> norm = expand(c.curve);
         const auto n = static_cast<int32_t>(norm.size());
-        norm.resize(norm.size() + 3);  // low values after the song, which must be ignored
+        norm.resize(norm.size() + 3);  // low values past the song, which must be ignored
         indexes found = c.valleys;
         found.resize(15);
         const auto nv = static_cast<int32_t>(c.valleys.size());
@@ -338,30 +315,26 @@ TEST(Tune, StartNearTheEndsOfTheSongIsReturnedUnchanged) {
     }
 }
 
-// Window k covers the steps k to k + 2, so a louder step s is a rise at window s - 3. The average
-// rise of five windows must exceed 0.13 dB. The start moves to the smallest change between windows
-// after the rise, the first of two equal ones.
+// The start moves to the largest rise, where the average of five windows exceeds the window before
+// them by more than 0.13 dB, and from there to the smallest change between windows.
 TEST(Tune, MovesToTheSharpestRise) {
-    // Mean squares from window 10 on: 0, 0.2, 0.3, 0.3, 0.2, 0.3, 0.3, 0.2, 0. The largest rise is
-    // at 10, and the only fall in its five steps is from 13 to 14.
+    // Of the five steps after the largest rise only the fourth is a fall.
     const char *song = "13 0 1 .6 1 .3 1 0 1 .3 1 .6 12 0";
     for (const int32_t rate : {8000, 11025, 22051, 44100})
         EXPECT_EQ(tune(song, rate, 20000), 22200u) << rate;
-    EXPECT_EQ(tune(song, kRate, 3000, 12), 5200u);  // exactly 9 s left
+    EXPECT_EQ(tune(song, kRate, 3000, 12), 5200u);  // 9 s are left, which is just enough
     EXPECT_EQ(tune(song, kRate, 3000, 11), 3000u);
     EXPECT_EQ(tune("13 0 17 .0382"), 5200u);  // a rise of 0.1305
     EXPECT_EQ(tune("13 0 17 .0378"), 3000u);  // a rise of 0.1292
     EXPECT_EQ(tune("30 .5"), 3000u);
-    EXPECT_EQ(tune("13 0 5 .039 12 0"), 5200u);  // all five windows must count
-    EXPECT_EQ(tune("3 0 27 .5"), 1200u);         // from the first window
-    EXPECT_EQ(tune("24 0 6 .5"), 9600u);         // from the sixth-to-last window
-    // The first of equal rises, at window 3; the step from 6 to 7 is level.
-    EXPECT_EQ(tune("6 0 5 .5 7 0 5 .5 7 0"), 2400u);
+    EXPECT_EQ(tune("13 0 5 .039 12 0"), 5200u);  // needs all five windows
+    EXPECT_EQ(tune("3 0 27 .5"), 1200u);         // the earliest and the latest possible rise
+    EXPECT_EQ(tune("24 0 6 .5"), 9600u);
+    EXPECT_EQ(tune("6 0 5 .5 7 0 5 .5 7 0"), 2400u);  // the first of two equal rises
 }
 
-// The song is 120 s long and loud from 60 s to 100 s. The window at 54 s is the last without the
-// loud part, so the coarse start is 54 s. Tuning moves it to 60.2 s, the start of the first window
-// that is completely loud.
+// A song that is loud from 60 s on has a coarse start of 54 s. Tuning moves it to 60.2 s, the start
+// of the first window that is completely loud.
 TEST(Position, ReturnsTheTunedStart) {
     EXPECT_EQ(find_position(make_pcm("60 .04 40 .64 20 .04", kRate), 120, 58), 60200u);
     EXPECT_EQ(find_position({}, 120, 0), 0u);
@@ -370,9 +343,8 @@ TEST(Position, ReturnsTheTunedStart) {
     clearHighlgihtCtx(nullptr);
 }
 
-// The coarse start is 112 s, and tuning it needs audio up to 120.6 s. The first PCM ends at 120 s,
-// so the start is left as it is, although the stated duration is longer. The second PCM has enough
-// audio, and the start moves to 116.2 s.
+// The coarse start of 112 s is tuned to 116.2 s only if the PCM is long enough for all windows,
+// whatever duration the file states.
 TEST(Position, TuningDoesNotReadPastThePcm) {
     EXPECT_EQ(find_position(make_pcm("116 .04 2 .64 2 .04", kRate), 200, 58), 112000u);
     EXPECT_EQ(find_position(make_pcm("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);

@@ -10,7 +10,7 @@ import java.util.concurrent.CountDownLatch;
 import java.util.concurrent.TimeUnit;
 
 /**
- * Tests the bridge in a real virtual machine, which cannot exit while a thread is still attached.
+ * Tests the bridge in a real virtual machine, which only exits once all threads are detached.
  * Arguments: a song with beats, a clip of 2 s, an empty directory.
  */
 public final class BridgeTest {
@@ -35,10 +35,10 @@ public final class BridgeTest {
         }
     }
 
-    /** Records the event of one analysis, calls deinit, which is forbidden there, and throws an exception. */
+    /** Records the event of an analysis. Inside the event it calls deinit, which must fail, and throws. */
     private static final class Recorder implements TavoListener {
         final CountDownLatch posted = new CountDownLatch(1);
-        volatile String events = "";  // the result of deinit in each
+        volatile String events = "";  // one result of deinit per event
         volatile int highlight;
         volatile int beats;
 
@@ -75,7 +75,7 @@ public final class BridgeTest {
         return recorder.highlight;
     }
 
-    /** A name with an emoji cannot be opened, but a descriptor of the file can. */
+    /** A file whose name contains an emoji cannot be opened, except through a descriptor. */
     private static void oddNamesAndDescriptors(String song, Path directory) throws Exception {
         int expected = highlight(song);
         Path copy = directory.resolve("Lied \u2013 \u00e4\u00f6\u00fc \u97f3\u697d.wav");

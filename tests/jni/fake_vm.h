@@ -1,6 +1,5 @@
-// A fake Java virtual machine: a function table with one class and one method. It counts the
-// references that it returns, and a test can choose a function that fails. Another test uses a real
-// machine to check the rules of the interface. Included by one file only.
+// A fake Java virtual machine with one class and one method. It counts the references that it
+// returns, and a test can make one of its functions fail. Only one file may include this header.
 #ifndef TAVO_TESTS_JNI_FAKE_VM_H
 #define TAVO_TESTS_JNI_FAKE_VM_H
 
@@ -21,44 +20,44 @@
 namespace fake_vm {
 
 struct event {
-    jobject object;             // as passed
-    std::vector<jint> numbers;  // event, arg1, arg2
+    jobject object;
+    std::vector<jint> numbers;  // the event's kind and two arguments
     std::optional<std::vector<float>> beats;
 };
 
-// Resources that the bridge has not returned; unreturned counts local references, characters and
+// Resources that the bridge has not released. `unreturned` counts local references, strings and
 // attached threads.
 std::atomic<int> global_references, unreturned, methods;
 std::atomic<bool> pending;         // true while an exception is pending
-std::atomic<int> misplaced_calls;  // calls made while an exception is pending
+std::atomic<int> misplaced_calls;  // number of calls made while an exception was pending
 
 // A test's settings of the machine, and the calls that it recorded.
 struct {
-    // The n-th call of this function fails (1 is the next call) as the interface specifies: it
-    // returns null with an exception pending, or an error code. CallStaticVoidMethod throws.
+    // The n-th call of this function fails; 1 is the next call. As the interface specifies, it
+    // returns null with an exception pending, or it returns an error code.
     std::string failing = {};
     int nth = 1;
-    // The action runs inside each call of this function, on its thread.
+    // Each call of this function runs the action, on the thread of the call.
     std::string watched = {};
     std::function<void()> action = {};
 
     std::vector<event> events = {};
-    std::string log_lines = {};  // the bridge's log lines, "priority: text"
+    std::string log_lines = {};  // written by the bridge, each as "priority: text"
 } machine_state;
 std::mutex lock;  // guards events and log_lines
 
 const std::thread::id own_thread = std::this_thread::get_id();
 std::vector<float> array;  // only one array exists at a time
 
-// Called at the start of each function that may fail.
+// Every function that may fail calls this first.
 bool must_fail(const std::string &function) {
     if (function == machine_state.watched) machine_state.action();
     if (pending) ++misplaced_calls;
     return function == machine_state.failing && --machine_state.nth == 0;
 }
 
-// Returns a new reference. Null, with an exception pending, if the call fails or the name is
-// unknown.
+// Returns a new reference. If the call fails or the name is unknown, an exception is pending and
+// the reference is null.
 template <typename T = jobject>
 T create_reference(const std::string &function, std::atomic<int> *count, bool exists = true) {
     static std::atomic<uintptr_t> last_handle;
@@ -94,7 +93,7 @@ JNINativeInterface_ functions() {
     table.NewGlobalRef = [](JNIEnv *, jobject) {
         return create_reference("NewGlobalRef", &global_references);
     };
-    // A string handle points to its characters. Each release frees one copy.
+    // A string's handle points to its characters. The bridge receives a copy and releases it.
     table.GetStringUTFChars = [](JNIEnv *, jstring string, jboolean *) -> const char * {
         const char *characters = reinterpret_cast<const char *>(string);
         return create_reference("GetStringUTFChars", &unreturned) != nullptr ? strdup(characters)
@@ -147,8 +146,7 @@ JavaVM machine = {&thread_table};
 
 }  // namespace fake_vm
 
-// Replaces the log library's function in this whole program, because the program's symbols come
-// first.
+// Replaces the log library's function, because the program's symbols precede those of libraries.
 extern "C" __attribute__((visibility("default"), format(printf, 3, 4))) int __android_log_print(
     int prio, const char *tag, const char *fmt, ...) {
     char text[512];

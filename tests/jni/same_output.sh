@@ -1,6 +1,6 @@
 #!/bin/sh
-# same_output.sh TAVO SONG JAVA...: checks that the Java command prints the highlight and the beats as the command
-# TAVO does. TAVO's stream and tempo lines are ignored, because no event reports them.
+# same_output.sh TAVO SONG JAVA...: checks that the Java command prints the same highlight and beats as the command
+# TAVO. The stream and the tempo, which no event reports, are ignored.
 set -eu
 tavo=$1
 song=$2
@@ -11,7 +11,7 @@ for options in '--mode highlight --length 10' '--mode beats --max-beats 8' '--mo
   printf '%s\n%s\n' "$options" "$native" | grep '[0-9]:[0-9]'
   [ "$native" = "$("$@" $options "$song")" ]
 done
-# A file that cannot be analysed gives status 1 and no standard output. Wrong usage gives 2.
+# The exit status is 1 for a file that cannot be analysed and 2 for wrong usage. Nothing is printed.
 # shellcheck disable=SC2086
 for wrong in '1 /nowhere/song.wav' '2 --mode loud song.wav'; do
   status=0

@@ -18,7 +18,7 @@ const std::string kNoHost = "6: Can't find com/kestu/tavo/Tavo\n";
 const std::string kNotNotified = "6: An exception occurred while notifying an event.\n";
 const std::string kNotAttached = "6: Failed to get the environment using AttachCurrentThread()\n";
 
-// The only object; the machine counts its references.
+// The only Java object. The machine counts the references to it.
 const auto object = reinterpret_cast<jobject>(&fake_vm::machine);
 
 void setup(jobject obj = object) {
@@ -55,11 +55,11 @@ struct Jni : testing::Test {
     }
     void TearDown() override {
         EXPECT_EQ(deinit(), 0);
-        expect_references(2);  // the class and the object passed to setup
+        expect_references(2);  // to the class and to the object that setup received
     }
 };
 
-// Must be the first test in this file, because nothing of the bridge may exist yet.
+// This must be the first test in this file, because none of the bridge's state may exist yet.
 TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     TAVO_INFO info = {};
     tavocallback(&info);  // no virtual machine
@@ -67,7 +67,7 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     EXPECT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), -1);
     ASSERT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), 0x10006);
 
-    // The callback before init: without a host class, without its method, and with both.
+    // Callbacks before init: without the host class, without its method, and with both.
     call_back_on_a_thread(info);
     EXPECT_EQ(machine_state.log_lines, kNotAttached + kNotNotified);
     machine_state = {"GetStaticMethodID"};
@@ -81,8 +81,8 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     EXPECT_EQ(machine_state.log_lines, kNotNotified + kNoInstance);
     EXPECT_EQ(tavo_jni_mutex, nullptr);
 
-    // An existing lock is used, not replaced. It is free while the path's characters are requested
-    // and held while they are released.
+    // An existing lock is used, not replaced. The bridge requests the path's characters before it
+    // takes the lock and releases them while it holds the lock.
     pthread_mutex_t existing_lock = PTHREAD_MUTEX_INITIALIZER;
     tavo_jni_mutex = &existing_lock;
     std::vector<int> trials;
@@ -102,7 +102,7 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     expect_references(2);
 }
 
-// No call inside an event waits for the lock, although a deinit on another thread holds it while it
+// Calls inside an event do not wait for the lock, even while deinit holds it on another thread and
 // waits for the event.
 TEST_F(Jni, JobIsOpenedStartedAndEndedOnce) {
     numbers inside;
@@ -175,8 +175,8 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
     }
 }
 
-// The callback runs on a thread that the machine knows, which stays attached. References that an
-// event uses stay valid until it has returned.
+// Here the callback runs on a thread that was already attached and stays so. The references that an
+// event uses stay valid until the event returns.
 TEST_F(Jni, RepeatedSetupReplacesTheReferences) {
     ASSERT_EQ(init(), 0);
     TAVO_INFO info = {};
@@ -189,7 +189,7 @@ TEST_F(Jni, RepeatedSetupReplacesTheReferences) {
     expect_references(2);
     machine_state.watched = "";
     tavocallback(&info);
-    setup(nullptr);  // a null object is passed on as null
+    setup(nullptr);  // events then have no object
     expect_references(1);
     tavocallback(&info);
 

@@ -1,5 +1,5 @@
-// The content of a file for each format source, and a fixture that opens and reads such files. The
-// fake codec library determines what the decoders deliver.
+// One file for each format source, and a fixture that opens and reads these files. The fake codec
+// library determines what the decoders deliver.
 #ifndef TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 #define TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 
@@ -26,15 +26,14 @@ inline const std::string kAsf = "\x30\x26\xB2\x75\x8E\x66\xCF\x11\xA6\xD9\x00\xA
 
 struct source_row {
     std::string name, file;
-    int32_t tag;  // codec of the stream; 0: the format's own
+    int32_t tag;  // codec tag of an MP4 track; 0 in other formats
     int32_t codec, frame_bytes;
-    int32_t channels;             // of the format; 0: same as the stream
+    int32_t channels;             // channels that the source reports; 0: those of the stream
     int32_t min_rate, max_rate;   // accepted sample rates, Hz
     std::string config;           // the decoder's configuration for 5 channels at 22,050 Hz
     std::string reader, decoder;  // prefixes of their function names; empty if not used
-    std::string opens;            // calls made by an open
-    std::string
-        codes;  // code of the open if the call at that place fails; 0: the result is ignored
+    std::string opens;            // the calls that an open makes, in order
+    std::string codes;            // for each call, the result of the open if it fails; 0: no effect
 };
 inline const std::string kAacConfig = bytes_of(xaac_config{{1, 2, 2, 0}, 3, 22050, 5, 0});
 inline const std::string kMpegConfig = bytes_of(wexa_config{1, 0, 2, 0});

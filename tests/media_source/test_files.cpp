@@ -9,7 +9,7 @@
 namespace {
 
 constexpr size_t kScanBytes = 32768;
-constexpr int64_t kBefore = 5;  // bytes before the content to be recognised
+constexpr int64_t kBefore = 5;  // bytes of the file before the content
 
 TEST(FileIo, CallbacksReadWriteAndSeek) {
     std::string path = testing::TempDir() + "tavo_file_io_" + std::to_string(getpid());
@@ -37,7 +37,7 @@ TEST(FileIo, CallbacksReadWriteAndSeek) {
     EXPECT_TRUE(mtsrc_file_tell(file, &value) == 0 && value == 8);
     EXPECT_EQ(mtsrc_file_close(file), 0);
 
-    // Each call is one system call: a pipe may never deliver the rest of a request.
+    // A read does not wait for the rest of its bytes, which a pipe may never deliver.
     int ends[2];
     EXPECT_TRUE(pipe(ends) == 0 && write(ends[1], "123456", 6) == 6);
     mtsrc_file handle = {ends[0]};
@@ -50,15 +50,15 @@ TEST(FileIo, CallbacksReadWriteAndSeek) {
     EXPECT_EQ(mtsrc_file_close(new (malloc(sizeof handle)) mtsrc_file{-1}), 0);
 }
 
-// Returns the type of a file positioned at the content, or the code of a failure. The record has
-// only the callbacks that probes may use.
+// Returns the recognised type of the content, or an error code. The record lacks the callbacks that
+// recognition must not use.
 int32_t type_of(std::string content, decltype(mtsrc_io::seek) seek = mtsrc_file_seek) {
     mtsrc_io io = {};
     io.read = mtsrc_file_read;
     io.tell = mtsrc_file_tell;
     io.seek = seek;
     io.skip = mtsrc_file_skip;
-    content.resize(std::max<size_t>(content.size(), 16));  // recognition always reads 16 bytes
+    content.resize(std::max<size_t>(content.size(), 16));  // recognition refuses shorter files
     content = zeros(kBefore) + content;
     mtsrc_file file = {memfd_create("content", 0)};
     EXPECT_GT(write(file.fd, content.data(), content.size()), kBefore);
@@ -107,13 +107,13 @@ TEST(Recognise, FirstBytesDetermineTheType) {
     EXPECT_EQ(type_of(kAsf, [](mtsrc_file *, const int64_t *) { return -1; }), -6);
 }
 
-// Returns the header twice, `distance` bytes apart. The second one is at the end of the file.
+// Returns a file with the header twice, `distance` bytes apart. The second one ends the file.
 std::string pair(const std::string &header, size_t distance) {
     return put(header, distance, header + zeros(1));
 }
 
-// The lists give the bitrate in kbit/s for each index from 1 on; `slots` is the number of slots of
-// a frame with 1 kbit/s at 1 kHz. A slot is one byte, in Layer I four. Padding adds one slot.
+// A frame consists of slots of one byte, or of four bytes in Layer I. Their number depends on the
+// bitrate, the sample rate and the padding, which adds one slot.
 TEST(ProbeMpeg, FindsTwoHeadersOneFrameLengthApart) {
     using list = std::vector<size_t>;
     const list kbit1 = {32, 64, 96, 128, 160, 192, 224, 256, 288, 320, 352, 384, 416, 448};
@@ -124,8 +124,10 @@ TEST(ProbeMpeg, FindsTwoHeadersOneFrameLengthApart) {
     const struct {
         char second;  // second byte of the header
         int32_t type;
-        size_t slots, slot_bytes, divisor;  // divisor: of the rates of MPEG-1
-        list kilobits;
+        size_t slots;       // of a frame with 1 kbit/s at 1 kHz
+        size_t slot_bytes;  // bytes per slot
+        size_t divisor;     // MPEG-1's sample rates are divided by it
+        list kilobits;      // bitrates of the indexes from 1 on
     } rows[] = {{'\xFF', 303, 12, 4, 1, kbit1},     {'\xFD', 304, 144, 1, 1, kbit2},
                 {'\xFB', 305, 144, 1, 1, kbit3},    {'\xF7', 303, 12, 4, 2, low_kbit1},
                 {'\xF5', 304, 144, 1, 2, low_kbit}, {'\xF3', 305, 72, 1, 2, low_kbit},
@@ -146,8 +148,8 @@ TEST(ProbeMpeg, FindsTwoHeadersOneFrameLengthApart) {
     }
 }
 
-// Free format and Layers I and II of MPEG-2.5, whose length is not needed for the second header.
-// Then invalid bitrate, rate, version, layer, a sync of 10 bits, and no sync byte.
+// Neither free format nor Layers I and II of MPEG-2.5 have a known frame length, so they are only
+// accepted as a second header. The other headers have an invalid field or no sync word.
 TEST(ProbeMpeg, InvalidHeadersAreRejected) {
     const std::pair<const char *, int32_t> cases[] = {
         {"\xFF\xFB\x01", 305},  {"\xFF\xE5\x90", 304},  {"\xFF\xE7\x90", 303},
@@ -157,33 +159,30 @@ TEST(ProbeMpeg, InvalidHeadersAreRejected) {
         expect_type(2199, {zeros(1) + put(kLayer3Pair, 0, header)});
         expect_type(as_second, {put(kLayer3Pair, 417, header)});
     }
-    // The distances that frames of those two layers would have.
-    expect_type(2199, {pair("\xFF\xE5\x90", 1044), pair("\xFF\xE7\x90", 624)});
 }
 
 TEST(ProbeMpeg, ScanContinuesAfterARejectedCandidate) {
-    // Two candidates overlap: at 0 a Layer I frame of 488 bytes without a successor, at 1 a Layer
-    // III frame of 52 bytes.
+    // Two candidates overlap. The first, at 0, has no second header; the other, at 1, has one.
     const std::string overlap = put("\xFF\xFF\xE2\x10", 53, "\xFF\xE2\x10\0"s) + zeros(600);
     expect_type(305, {"\xFF\xFB\x90" + kLayer3Pair, overlap});
-    // A second header at 32,764 ends the scan, so a shorter pair after the candidate is not found.
+    // A pair is only found if its second header starts in the first 32 KiB, less four bytes.
     const std::string late = put(zeros(kScanBytes), 32500, pair("\xFF\xFF\x10", 32));
     expect_type(305, {put(zeros(kScanBytes), 32763 - 417, kLayer3Pair)});
     expect_type(303, {late});
     expect_type(2199, {put(late, 32764 - 417, "\xFF\xFB\x90")});
-    // Headers inside a tag are ignored, but not headers inside bytes that only resemble a tag.
+    // Headers inside a tag are skipped, but not those inside bytes that only resemble a tag.
     const std::string tag = put(id3(1000), 20, kLayer3Pair), long_tag = zeros(100) + id3(40000);
     const std::string tags = id3(3) + id3(0) + zeros(7) + id3(50);
     expect_type(305,
                 {long_tag + kLayer3Pair, tags + kLayer3Pair, put(tag, 3, "\1"), put(tag, 3, "\5")});
     expect_type(2199, {long_tag, id3(3) + tag + zeros(20), put(tag, 3, "\2"), put(tag, 3, "\4")});
-    for (const size_t inside : {4u, 6u, 9u, 10u}) {  // number of the tag's bytes in the buffer
+    for (const size_t inside : {4u, 6u, 9u, 10u}) {  // bytes of the tag inside the scan's buffer
         const std::string before = zeros(kScanBytes - inside) + id3(700);
         expect_type(305, {before + kLayer3Pair});
         expect_type(2199, {before, zeros(kScanBytes - inside) + "ID3\3" + zeros(5)});
     }
-    // Ogg, a program stream and a similar start code. A transport stream has its second sync byte
-    // at offset 188 of the file, wherever the content to be recognised starts.
+    // Ogg, program streams and transport streams are not scanned. A transport stream is recognised
+    // by a sync byte at offset 188 of the file, even if the content starts later.
     const std::string sync = "\x47" + kLayer3Pair;
     expect_type(2199, {"OggS" + kLayer3Pair, "\0\0\1\xBA"s + kLayer3Pair});
     expect_type(2199, {put(sync, 188 - kBefore, "\x47"), "\x47"});

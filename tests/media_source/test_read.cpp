@@ -1,4 +1,4 @@
-// Reading, seeking and resetting: frames through the decoder into the queue and out of it.
+// Reads, seeks and resets of a source, whose frames pass through the decoder and the queue.
 #include "tests/media_source/source_case.h"
 
 namespace {
@@ -6,9 +6,10 @@ namespace {
 using result = std::pair<int32_t, samples>;
 using frames = std::vector<fake_codec::frame>;
 
-constexpr int32_t kAll = 900'000;  // bytes: more than the stream has, fewer than the queue holds
+constexpr int32_t kAll = 900'000;  // bytes; more than any stream here, less than the queue's size
 
-// A frame of one stereo pair with equal channels. It is not the first frame of the stream.
+// Returns a frame of one stereo pair, which does not start at 0 as the first frame of a stream
+// does.
 fake_codec::frame pair_frame(int16_t value, int32_t decode_result = 0, int32_t produced = 1) {
     return {{value, value}, 1000 + value, 0, decode_result, produced};
 }
@@ -31,7 +32,7 @@ fake_codec::frame with_decoded_bytes(int32_t bytes) {
     return frame;
 }
 
-// Returns the samples delivered for pair frames: one per frame, or both in Ogg.
+// Returns the samples that a source delivers for pair frames: one per frame, but both in Ogg.
 samples expected_of(const source_row &row, const samples &values) {
     samples out;
     for (const int16_t value : values) out.insert(out.end(), row.codec == 323 ? 2 : 1, value);
@@ -39,7 +40,7 @@ samples expected_of(const source_row &row, const samples &values) {
 }
 
 struct Reading : SourceTest {
-    // Returns the code and the samples delivered.
+    // Returns the result code and the delivered samples.
     result read(int32_t bytes) const {
         samples data(static_cast<size_t>(bytes / 2 + 2), 0x7EEE);
         mtsrc_frame frame = {data.data(), 0};
@@ -72,14 +73,15 @@ TEST_F(Reading, FramesAreDecodedIntoTheQueue) {
     });
 }
 
-// A single frame that cannot be decoded is skipped. A second one in a row ends the call without a
-// reset, and so does a failed read or an impossible count. Samples in the queue stay there.
+// A frame that cannot be decoded is skipped, and the decoder is reset. A second one in a row makes
+// the read fail, as do a failed read of a frame and an impossible byte count. Samples that were
+// already in the queue are delivered by the next read.
 TEST_F(Reading, OneUndecodableFrameIsSkipped) {
     for_each_row([&](const source_row &row) {
         const int32_t too_many =
             1'048'575 + (row.codec == 322 ? 131'070 : 0);  // exceeds the free bytes
         const struct {
-            frames bad;  // between frames with the samples 2 and 6
+            frames bad;  // between good frames with the samples 2 and 6
             int32_t code;
             size_t resets;
         } cases[] = {{{unreadable(2)}, -6, 0},
@@ -117,8 +119,7 @@ TEST_F(Reading, PcmIsReducedToOneChannel) {
     samples late(1058, 1), after_delay(529, 1);  // one stereo pair after the decoder's delay
     late.insert(late.end(), {7, 7});
     after_delay.push_back(7);
-    // Frames of 7 and 6 bytes. Each delivers 3 bytes, so the second one is copied to an odd
-    // address.
+    // Frames with an odd number of bytes are joined without a gap.
     const frames odd = {{{0x0201, 5, 6, 7}, 1, 0, 0, 1, 7}, {{0x0A09, 7, 7, 7}, 2, 0, 0, 1, 6}};
     const struct {
         const char *row;
@@ -133,13 +134,13 @@ TEST_F(Reading, PcmIsReducedToOneChannel) {
         {"ogg", 2, {{pcm, 1}}, pcm},
         {"wav", 1, {{pcm, 1}, {{}, 2}}, pcm},
         {"wav", 3, {{pcm, 1}}, first_of_three},
-        {"mpeg", 2, {{pcm, 1}}, {-1, 1, 32767, -32768, 0, 7}},  // the mean of the two channels
+        {"mpeg", 2, {{pcm, 1}}, {-1, 1, 32767, -32768, 0, 7}},  // the mean of both channels
         {"mpeg", 3, {{pcm, 1}}, {-1, 16383, -32768, -16380}},   // the mean of the first two
         {"mpeg", 2, {{late, 0}, {{8, 8}, 9}}, {7, 8}},
         {"mpeg",
          2,
          {{samples(800, 1), 0}, {{8, 8}, 9}},
-         {8}},  // a frame shorter than the delay: only that frame is dropped
+         {8}},  // only the first frame is dropped, although it is shorter than the delay
         {"mpeg", 2, {{late, 1}}, after_delay},
         {"mpeg", 2, {{late, 0}}, after_delay, 48000},
         {"mpeg", 1, {{late, 0}}, late},
@@ -151,7 +152,7 @@ TEST_F(Reading, PcmIsReducedToOneChannel) {
     }
 }
 
-// The largest block, 65,535 sample pairs, decodes to twice the bytes that are free in the queue.
+// Blocks of the largest size, 65,535 sample pairs, do not overflow the queue.
 TEST_F(Reading, LargestFlacBlockFitsTheQueue) {
     samples block, expected;
     for (size_t i = 0; i < 131'070; ++i) block.push_back(static_cast<int16_t>(i / 2));
@@ -163,8 +164,7 @@ TEST_F(Reading, LargestFlacBlockFitsTheQueue) {
     EXPECT_TRUE(got == result(0, expected) && rest.first == 1);
 }
 
-// Ogg delivers every decoded byte. The 160 frames have 16,384 bytes each, and every sample is its
-// frame's number.
+// The stream has 160 frames of 16,384 bytes, in which every sample is the frame's number.
 TEST_F(Reading, RequestsOfAnySizeAreDelivered) {
     frames numbered;
     for (int16_t i = 0; i < 160; ++i) {  // the frames fill their buffer
@@ -177,24 +177,25 @@ TEST_F(Reading, RequestsOfAnySizeAreDelivered) {
     EXPECT_EQ(read(-1).first, -4);
     EXPECT_EQ(mtsrc_getstream(src, 10, &no_data), -4);
     EXPECT_EQ(mtsrc_getstream(src, 10, nullptr), -4);
-    // With exactly one frame's bytes free, the queue is compacted first.
+    // When only one more frame would fit, the queue moves its bytes to its start before it is
+    // filled.
     for (int16_t i = 0; i < 63; ++i) EXPECT_EQ(read(16'384), result(0, samples(8192, i)));
     expect_queue(1'032'192, 1'032'192);
     EXPECT_EQ(read(2), result(0, {63}));
     expect_queue(2, 16'384);
     EXPECT_EQ(read(16'382), result(0, samples(8191, 63)));
-    // After 63 frames the free bytes of one frame are not enough. The frames stay in the queue.
+    // A request for almost the whole queue fails, but the frames that were read stay in the queue.
     EXPECT_EQ(read(1'048'575), result(-4, {}));
     expect_queue(0, 1'032'192);
     for (int16_t i = 64; i < 160; ++i) EXPECT_EQ(read(16'384), result(0, samples(8192, i)));
-    EXPECT_EQ(read(3'000'000), result(1, {}));  // more than the queue can hold, but nothing is left
-    EXPECT_EQ(read(2), result(1, {}));          // the reader is asked again each time
+    EXPECT_EQ(read(3'000'000), result(1, {}));  // at the end a request of any size is valid
+    EXPECT_EQ(read(2), result(1, {}));          // the reader is called again each time
     EXPECT_EQ(fake_codec::calls_of("xoggds_get_frm").size(), 162u);
 }
 
 TEST_F(Reading, SeekAndResetEmptyTheQueue) {
     for_each_row([&](const source_row &row) {
-        const bool wav = row.decoder.empty();  // seeks to whole seconds and has no decoder
+        const bool wav = row.decoder.empty();  // WAV has no decoder and seeks to whole seconds
         const std::string reset = wav ? "" : row.decoder + "_reset ";
         fake_codec::stream_spec stream;
         stream.frames = {pair_frame(2), pair_frame(4), pair_frame(6)};
@@ -220,7 +221,7 @@ TEST_F(Reading, SeekAndResetEmptyTheQueue) {
         expect_queue(0, 0);
         EXPECT_EQ(read(1), result(1, {}));
     });
-    // In MP4 a source with another codec has no decoder and delivers only what is queued.
+    // An MP4 source with another codec has no decoder, so it delivers only what the queue holds.
     open_frames(row_of("mp4 with aac"), {pair_frame(2), pair_frame(4)});
     EXPECT_EQ(read(1).first, 0);
     src->codec = 307;
@@ -229,7 +230,7 @@ TEST_F(Reading, SeekAndResetEmptyTheQueue) {
     src->codec = 306;
 }
 
-// aac_get_hz consumes the frame that it reads.
+// aac_get_hz reads the rate from the next frame, which is then lost.
 TEST_F(Reading, AacRateComesFromTheNextFrame) {
     open_frames(row_of("aac"), {with_read_bytes(24'576), with_read_bytes(24'577), pair_frame(6)});
     EXPECT_EQ(aac_get_hz(src->demux, src->decoder), 44100);

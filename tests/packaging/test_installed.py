@@ -1,4 +1,4 @@
-"""Installs into a folder and builds programs against it, with the CMake package and with pkg-config."""
+"""Tests what is installed. Programs are built with its CMake package and with pkg-config."""
 import array
 import json
 import os
@@ -24,7 +24,7 @@ class Installed(unittest.TestCase):
     @classmethod
     def setUpClass(cls):
         cls.folder = pathlib.Path(cls.enterClassContext(tempfile.TemporaryDirectory()))
-        # Installed and then moved, because nothing may depend on the original folder.
+        # The folder is moved afterwards, because nothing may depend on its first path.
         run(CMAKE, "--install", BUILD, "--prefix", cls.folder / "first place")
         cls.prefix = (cls.folder / "first place").rename(cls.folder / "prefix")
         cls.lib = cls.prefix / LIBDIR
@@ -41,8 +41,7 @@ class Installed(unittest.TestCase):
         return run("pkg-config", *arguments, "tavo", env=environment).split()
 
     def build_and_run(self, compiler, source, *options):
-        """Returns the program's output for the song. It runs in an empty folder, which must stay empty: no
-        click track."""
+        """Returns the program's output for the song. It must not write a file, such as a click track."""
         program = source.with_suffix(".program")
         run(compiler, *options, *STRICT, source, *self.pkg_config("--cflags", "--libs"), "-o", program)
         with tempfile.TemporaryDirectory() as empty:
@@ -96,14 +95,14 @@ class Installed(unittest.TestCase):
         self.assertEqual(os.readlink(self.lib / "libtavo.so"), SONAME)
 
     def test_libraries(self):
-        """Libraries find each other by relative paths. Those with common names are in their own folder."""
+        """Libraries find each other by relative paths. Those with common names are in a folder of their own."""
         self.assertEqual({path.name.split(".")[0] for path in self.lib.glob("lib*")}, {"libtavo"})
         environment = {k: v for k, v in os.environ.items() if k != "LD_LIBRARY_PATH"}
         found = dict(re.findall(r"(\S+) => (\S.*) \(", run("ldd", self.tavo, env=environment)))
         for name, folder in ((SONAME, self.lib), ("libwexaaudio.so", self.lib / "tavo"),
                              ("liblog.so", self.lib / "tavo")):
             self.assertEqual(pathlib.Path(found[name]).resolve().parent, folder.resolve(), name)
-        words = [self.tavo, "--store", "postgresql://127.0.0.1:9/x", self.song]  # its module is loaded on demand
+        words = [self.tavo, "--store", "postgresql://127.0.0.1:9/x", self.song]  # loads a module
         self.assertIn("refused", subprocess.run(words, text=True, capture_output=True, env=environment).stderr)
 
     def test_hardened(self):
@@ -114,12 +113,12 @@ class Installed(unittest.TestCase):
             report = subprocess.run(["hardening-check", path], text=True, stdout=subprocess.PIPE).stdout
             for property_name in ("Stack protected", "Read-only relocations", "Immediate binding", *also):
                 self.assertIn(f" {property_name}: yes", report, path)
-            # hardening-check looks for a mark that Debian's own start-up files lack.
+            # hardening-check misses control-flow protection, because Debian's start-up files lack its mark.
             if platform.machine() == "x86_64":
                 self.assertIn("endbr64", run("objdump", "-d", path), path)
 
     def test_interface_only_grows(self):
-        """Runs abidiff with packaging/tavo.abi. UPDATE_ABI=1 rewrites that file once a release has added functions."""
+        """Compares the interface with packaging/tavo.abi. After a release with new functions, UPDATE_ABI=1 rewrites it."""
         kept = ROOT / "packaging/tavo.abi"
         names = ROOT.joinpath("packaging/exports.txt").read_text().split("# version TAVO_1:")[1].split("# version")[0]
         sources = [*ROOT.glob("core/*.cpp"), ROOT / "media_source/mtsrc.cpp", ROOT / "beat/click_track.cpp"]

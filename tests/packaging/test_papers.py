@@ -1,4 +1,4 @@
-"""The man page and the completions have the options of the command, and no others."""
+"""Tests that the man page and the completions have exactly the options of the command."""
 import os
 import pathlib
 import re
@@ -16,7 +16,7 @@ def run(*command):
 
 
 def complete(*words, folder="/"):
-    """Returns what bash offers for the last word."""
+    """Returns the completions that bash offers for the last word."""
     script = ('source "$1"; cd "$2"; shift 2; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); _tavo; '
               'for word in "${COMPREPLY[@]}"; do echo "$word"; done')
     output = run("bash", "--norc", "-c", script, "bash", BASH, folder, "tavo", *words)
@@ -29,7 +29,7 @@ def complete_in_fish(word):
     return sorted(line.split("\t")[0] for line in output.splitlines())
 
 
-class Papers(unittest.TestCase):
+class ManPageAndCompletions(unittest.TestCase):
     def test_options(self):
         lines = re.findall(r"^  (-.*?)(?:\s{2,}|\s[A-Z]|$)", run(TAVO, "--help").stdout, re.MULTILINE)
         expected = set(OPTION.findall("\n".join(lines)))
@@ -43,14 +43,14 @@ class Papers(unittest.TestCase):
         self.assertEqual(set(OPTION.findall(re.sub(r"_arguments.*|\[.*?\]", "", ZSH.read_text()))), expected)
 
     def test_short_help(self):
-        """-h fits one screen and names every option."""
+        """The output of -h fits on one screen and names every option."""
         lines = run(TAVO, "-h").stdout.splitlines()
         self.assertLessEqual((len(lines), max(map(len, lines))), (24, 80))
         named = set(OPTION.findall("\n".join(line for line in lines[lines.index("Examples:") + 6:])))
         self.assertEqual(named, set(complete("-")))
 
     def test_choices(self):
-        """The completions of an option's value are the values that the option accepts."""
+        """The values offered for an option are those that it accepts."""
         for option in ("--mode", "--format", "--fps"):
             refused = subprocess.run([TAVO, option, "?", "x"], capture_output=True, text=True)
             choices = sorted(re.search(r"{(.*)}", refused.stderr)[1].split(","))
@@ -59,7 +59,7 @@ class Papers(unittest.TestCase):
             (offered,) = re.findall(option + r"=(?:}')?\[.*:\((.*)\)'", ZSH.read_text())
             self.assertEqual(sorted(offered.split()), choices)
 
-    def test_page_is_clean(self):
+    def test_page_has_no_warnings(self):
         done = run("groff", "-man", "-ww", "-Tutf8", "-z", PAGE)
         self.assertEqual(done.stdout + done.stderr, "")
 

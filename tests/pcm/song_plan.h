@@ -1,5 +1,5 @@
-// An instance with a planned decoding. The fake codec library describes the stream, and the test
-// supplies its bytes.
+// A fixture with an instance whose decoding is planned. The fake codec library describes the
+// stream, and each test supplies its bytes.
 #ifndef TAVO_TESTS_PCM_SONG_PLAN_H
 #define TAVO_TESTS_PCM_SONG_PLAN_H
 
@@ -20,15 +20,14 @@ using support::noise, support::slice;
 using sample_run = std::vector<int16_t>;
 using signal_run = std::vector<double>;
 
-// Returns the `n` values of a conversion's output and the 64 zero bytes after them, and frees the
-// output.
+// Returns the `n` values of a conversion's output and the eight zeros after them. Frees the output.
 inline signal_run read_output(double *out, int64_t n) {
     signal_run result(out, out + n + 8);
     free(out);
     return result;
 }
 
-// Converts `bytes` bytes of PCM and returns the output as read_output does.
+// Converts `bytes` bytes of PCM to the analysis rate and returns the output as read_output does.
 inline signal_run convert_pcm(const void *pcm, size_t bytes, int32_t rate) {
     int64_t n = -1;
     double *out = nullptr;
@@ -39,15 +38,15 @@ inline signal_run convert_pcm(const void *pcm, size_t bytes, int32_t rate) {
     return read_output(out, n);
 }
 
-// The stream that a source delivers after planning, and the requests that it received.
+// Replaces the functions of a source after planning: delivers a stream and records the requests.
 struct fake_source {
     std::string stream = {};
     int64_t at = 0;               // offset of the next byte
-    int64_t fail_at = INT64_MAX;  // reads from this offset on fail
-    int empty_replies = 0;        // number of empty reads before all others
+    int64_t fail_at = INT64_MAX;  // reads that end after this offset fail
+    int empty_replies = 0;        // number of reads that deliver nothing before the others
     int32_t code = 0;             // result of a read before the end of the stream
-    int64_t seek_target = -1;     // byte that the next seek reaches, or -1
-    int64_t seek_report = -1;     // units that the next seek reports, or -1
+    int64_t seek_target = -1;     // byte that the next seek reaches; -1: the requested one
+    int64_t seek_report = -1;     // position that it reports, 100-ns units; -1: the requested one
     bool seek_fails = false;      // the next seek fails and reports nothing
     std::vector<int64_t> seeks = {};
     int32_t max_request = 0;

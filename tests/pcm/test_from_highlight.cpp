@@ -9,11 +9,11 @@ namespace {
 constexpr int32_t kRate = 8000;
 constexpr int64_t kBytes = 320'000;         // 20 s
 constexpr int64_t kDuration = 200'000'000;  // units
-constexpr int64_t kBlock = 4608;            // start of the probe's block, bytes
+constexpr int64_t kBlock = 4608;            // offset of the compared block after a seek, bytes
 
 using positions = std::vector<int64_t>;
 
-// Twenty seconds at 8000 Hz in four segments, decoded as in mode 2.
+// A stream of 20 s at 8000 Hz, decoded in four segments for mode 2.
 class FromHighlight : public song_plan {
  protected:
     void decode(const std::string &played) {
@@ -22,7 +22,8 @@ class FromHighlight : public song_plan {
         ctx.ana_rate = kAnalysisRate;
         ASSERT_EQ(DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes), kBytes);
     }
-    // Expects the analysis signal of `bytes` for a highlight at `pos`, and the report of `hl_pos`.
+    // Expects that the analysis signal for a highlight at `pos` ms consists of `bytes`, and that
+    // the highlight is then reported at `hl_pos`.
     void expect_from(int64_t pos, const std::string &bytes, uint32_t hl_pos) {
         EXPECT_EQ(tavo_get_from_here(&ctx, pos), 0);
         EXPECT_EQ(ctx.pcm, nullptr);
@@ -40,28 +41,28 @@ TEST_F(FromHighlight, FirstSecondIsTheStartOfTheFile) {
     expect_from(1000, stream, 0);
     EXPECT_TRUE(sources[0].seeks.empty());
     decode(stream);
-    // The PCM is cut without decoding, using only the record's source.
+    // The signal is cut from the PCM. Only the source of the first record is used.
     for (int i = 0; i < 4; ++i) ctx.seg[i].got = 0;
     ctx.seg[0].fmt = {};
     ctx.seg[0].duration = 0;
     expect_from(1001, slice(stream, 16'016, kBytes), 1001);
     EXPECT_EQ(sources[0].seeks, positions{10'010'000});
     decode(stream);
-    sources[0].seek_fails = true;  // the source is past its segment, at byte 112,000
+    sources[0].seek_fails = true;  // the source delivers other audio, so the rest is decoded again
     expect_from(2500, slice(stream, 40'000, kBytes), 2500);
     EXPECT_EQ(sources[0].seeks, (positions{25'000'000, 25'000'000}));
 }
 
 TEST_F(FromHighlight, SeekPositionIsFoundInThePcm) {
-    // A seek position of 2500 ms is expected at byte 40,000, and its block is searched in bytes
-    // 24,000 to 87,999. One of 1100 ms is expected at byte 17,600 and searched from byte 1600 on.
+    // After a seek to 2500 ms, byte 40,000, the decoded block is searched in bytes 24,000 to 87,999
+    // of the PCM. If it is not found there, the rest of the song is decoded again.
     const struct {
         const char *name;
         uint32_t ms;             // position that the seek reports
         int64_t reached;         // byte that the seek reaches
         positions copies;        // bytes to which the probe's block is copied
         int64_t start;           // first byte of the signal
-        bool found = true;       // false: decoded again
+        bool found = true;       // false: the rest is decoded again
         int64_t bytes = kBytes;  // of the PCM
     } cases[] = {
         {"as expected", 2500, 40'000, {}, 40'000},
@@ -106,8 +107,8 @@ TEST_F(FromHighlight, SecondDecodingReleasesTheFirst) {
     EXPECT_EQ(hl.hl_pos, 20'000U);
 }
 
-// The record is a separate heap block, so that a sanitizer detects a read of another record. It
-// implies 50,000 bytes of PCM; a duration of 0 implies no size.
+// The record is a heap block of its own, so that a sanitizer detects a read of another record. The
+// block is searched only in the bytes that the record's duration covers.
 TEST_F(FromHighlight, ComparisonReadsOnlyItsRecord) {
     ASSERT_EQ(plan(kDuration, kRate, stream), 0);
     const auto seg = std::make_unique<TAVO_DECSEG>();

@@ -17,44 +17,41 @@ state_ptr prepare(int32_t source, int32_t target = kAnalysisRate, int32_t code =
     return state;
 }
 
-// Returns the outputs `first` to `n` - 1 of a block average. The input is silent before `base`.
+// Returns the outputs `first` to `n` - 1 of a conversion by block averages. The input consists of
+// `base` zeros and `in`.
 signal_run average(int32_t source, int32_t target, int64_t first, int64_t n, const sample_run &in,
                    int64_t base = 0) {
     const int64_t count = base + int64_t(in.size());
-    // calloc of a large block: only the pages in use take memory.
+    // The pages of a block from calloc take no memory until they are written.
     auto *input = static_cast<int16_t *>(calloc(size_t(count) + 1, sizeof(int16_t)));
     std::copy(in.begin(), in.end(), input + base);
     signal_run out(size_t(n) + 1, -1.0);
     resamplePcmMonoMT(input, count, source, out.data(), n, target);
-    EXPECT_TRUE(ext_mutex_resample == nullptr &&
-                out.back() == -1.0);  // the call creates its own lock
+    EXPECT_TRUE(ext_mutex_resample == nullptr && out.back() == -1.0);  // the lock was released
     free(input);
     return slice(out, first, n);
 }
 
 TEST(ResampleBlock, AveragesBlocks) {
-    // The spacing of floats near 32766.666015625 is 1/512.
+    // An average is rounded to single precision.
     EXPECT_EQ(average(33075, 11025, 0, 2, {1, 0, 0, 32767, 32767, 32766}),
               (signal_run{0.3333333432674407958984375, 32766.666015625}));
     const sample_run in = {10, 20, 30, 40, 50};
-    // Block [4, 6) is cut to the last sample. Block [6, 8) is past the end and uses it too.
+    // A block that extends past the end is cut. One that starts past it uses the last sample.
     EXPECT_EQ(average(2, 1, 0, 4, in), (signal_run{15, 35, 50, 50}));
-    // Blocks [0, 0) [0, 1) [1, 1) [1, 2) [2, 2). An empty block uses the sample at its start.
+    // An empty block, here every other one, uses the sample at its start.
     EXPECT_EQ(average(1, 2, 0, 5, in), (signal_run{10, 10, 20, 20, 30}));
     EXPECT_EQ(average(1, 1, 0, 1, {}), signal_run{-1});
-    // Above 2^24 floats are even, and ties round to the multiple of 4.
+    // Block positions have single precision, so they are even numbers above 2^24.
     constexpr int64_t kEven = 16'777'216;
     const sample_run ramp = {2, 1, 2, 3, 4, 5, 6, 7};
-    // Positions relative to base: 0, 0, 2, 4, 4. Blocks [0, 0) empty, [0, 2), [2, 4), [4, 4) empty.
     EXPECT_EQ(average(1, 1, kEven, kEven + 4, ramp, kEven), (signal_run{2, 1.5, 2.5, 4}));
-    // Positions relative to base: -1, 2, 4 (rounded from 5), 8. Blocks of 3, 2 and 4 samples.
     EXPECT_EQ(average(3, 1, kEven / 3, kEven / 3 + 3, ramp, kEven - 1),
               (signal_run{1.66666662693023681640625, 3.5, 6}));
 }
 
-// The expected values were computed independently from the formula of the windowed sinc, in the
-// same precisions; the sine may differ in its last bit. The centre coefficient is the cut-off over
-// pi: 0.9 / 8.
+// The expected values come from a separate computation in the same precisions. Only the last bit of
+// the sine may differ.
 TEST(ResampleSinc, TableHoldsTheWindowedSinc) {
     for (const auto &[rate, phase, tap, want] : {std::tuple{48000, 0, 9, 0.20671874284744263},
                                                  {48000, 240, 0, -5.7826164265861735e-6},
@@ -66,14 +63,14 @@ TEST(ResampleSinc, TableHoldsTheWindowedSinc) {
     }
     EXPECT_EQ(prepare(48000)->ratio, 48000.0f / 11025.0f);
     EXPECT_EQ(prepare(7, 1)->ratio, 7.0f);
-    // 88,201 / 11,025 differs from a whole ratio by 0.00009, 88,202 / 11,025 by 0.00018.
+    // A ratio within 0.0001 of a whole number has 20 taps, any other 19.
     for (const auto &[rate, taps] : {std::pair{88201, 20}, {88202, 19}, {-48000, 19}})
         EXPECT_EQ(prepare(rate)->taps, taps) << rate;
     for (const auto &[source, target] : {std::pair{2, 0}, {48000, -1}, {0, kAnalysisRate}})
         EXPECT_EQ(prepare(source, target, -1)->taps, 0) << source;
 }
 
-// A filter of 2 taps with the coefficients a, b, c in the middle phase.
+// Returns a filter whose middle phase has the coefficients a, b and c.
 state_ptr three_taps(float a, float b, float c, float ratio = 1.0f) {
     auto state = std::make_unique<dorn_resampler_state>();
     state->taps = 2;
@@ -92,7 +89,7 @@ sample_run filter(const state_ptr &state, const sample_run &in) {
     return out;
 }
 
-// Tests sums that no real filter produces. fuzz/stages.cpp tests real filters, ends and channels.
+// No real filter produces these sums. fuzz/stages.cpp tests real filters, both ends and channels.
 TEST(ResampleSinc, RoundsAndWrapsSums) {
     const auto filter_constant = [](int16_t sample, float a, float b, float c) {
         return slice(filter(three_taps(a, b, c), sample_run(20, sample)), 1, 18);
@@ -100,7 +97,7 @@ TEST(ResampleSinc, RoundsAndWrapsSums) {
     // Halves are rounded up.
     EXPECT_EQ(filter_constant(3, 0, 0.5f, 0), sample_run(17, 2));
     EXPECT_EQ(filter_constant(-3, 0, 0.5f, 0), sample_run(17, -1));
-    // In tap order and in single precision, 2^24 + 1 stays 2^24.
+    // Products are added in the order of the taps and in single precision.
     EXPECT_EQ(filter_constant(1, 16'777'216.0f, 1, -16'777'214.0f), sample_run(17, 2));
     // Sums that exceed 16 bits wrap, even if they also exceed 32 bits.
     EXPECT_EQ(filter_constant(5000, 0, 1000.0f, 0), sample_run(17, 19'264));
@@ -116,8 +113,7 @@ TEST(ResampleSinc, RefusesBadArgumentsAndPhases) {
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), 100, nullptr), -1);
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), -1, out.data()), 0);
     EXPECT_EQ(filter(prepare(-48000), in).back(), -1);
-    // With an even number of taps and a ratio that is not whole, the offset is 0 or 1/2, which is
-    // still a valid phase. With a ratio of 1.125 it is 5/8 at j = 5.
+    // A phase of 1/2 is still valid. With a ratio of 1.125 the sixth output has a phase of 5/8.
     auto drifting = three_taps(0, 1, 0, 1.5f);
     drifting->coef[960][1] = 5.0f;
     EXPECT_EQ(filter(drifting, in)[1], 5);
@@ -125,11 +121,11 @@ TEST(ResampleSinc, RefusesBadArgumentsAndPhases) {
     drifting->ratio = 1.125f;
     EXPECT_EQ(slice(filter(drifting, in), 2, 6), (sample_run{0, 0, 5, 77}));
     EXPECT_EQ(filter(drifting, in).back(), -1);
-    // The end is tested in single precision: 2^27 + 10 rounds to 2^27 + 16, past the input.
+    // The end is compared in single precision, in which the last position is past the input.
     constexpr int32_t kLong = (1 << 27) + 12;
     auto *silence = static_cast<int16_t *>(calloc(kLong, sizeof(int16_t)));
     drifting->taps = 20;
-    drifting->ratio = 33'554'432.0f;  // a quarter of 2^27
+    drifting->ratio = 33'554'432.0f;  // the fifth output would be at 2^27
     EXPECT_EQ(dorn_resampler_convert(drifting.get(), silence, kLong, out.data()), 4);
     free(silence);
 }
@@ -175,7 +171,7 @@ TEST(ResampleRun, InPlaceConversionIsBitIdentical) {
                       convert_pcm(rest.data(), rest.size(), rate));
         }
     }
-    // Where single precision rounds positions, a block may be offset from its output.
+    // Rounded positions above 2^24 move a block relative to its output.
     constexpr size_t kTail = 20'000;  // outputs
     const std::string tail = noise(kTail * 8 + 160, 6);
     TAVO_CTX ctx = with_pcm(((1 << 24) + kTail) * 8, 44100);

@@ -1,4 +1,4 @@
-"""The installed Python package with real files. The environment defines CMAKE, BUILD and SONGS."""
+"""Tests the installed Python package with real files."""
 import contextlib
 import functools
 import json
@@ -14,7 +14,7 @@ from concurrent.futures import ThreadPoolExecutor
 CMAKE, BUILD, SONGS = os.environ["CMAKE"], os.environ["BUILD"], pathlib.Path(os.environ["SONGS"])
 ROOT = pathlib.Path(__file__).parents[2]
 EXAMPLE = ROOT / "examples" / "beats_against_reference.py"
-JAMS = {  # required fields of a file, an annotation and an observation, by the documentation of JAMS
+JAMS = {  # fields that the documentation of JAMS requires
     "required": ["annotations", "file_metadata", "sandbox"],
     "properties": {
         "file_metadata": {"required": ["duration", "jams_version"]},
@@ -57,12 +57,12 @@ class Package(unittest.TestCase):
 
     def test_same_as_the_command(self):
         self.assertGreater(len(songs), 3)
-        with ThreadPoolExecutor(3) as pool:  # they run one after another
+        with ThreadPoolExecutor(3) as pool:  # calls from any thread run one after another
             for mode in ("highlight", "beats", "both"):
                 results = pool.map(functools.partial(tavo.analyze, mode=mode), songs)
                 for result, line in zip(results, run_command("--mode", mode, *songs), strict=True):
                     self.assert_same(result, line)
-        self.assertEqual(os.listdir(), [])  # no click track
+        self.assertEqual(os.listdir(), [])  # no click track was written
 
     def test_arguments_reach_the_library(self):
         (line,) = run_command("--length", "10", "--max-beats", "3", songs[0])
@@ -131,7 +131,7 @@ class Package(unittest.TestCase):
         np.testing.assert_array_equal(first.beats, same.beats)
         for result, line in zip((first, other), run_command(*songs[:2]), strict=True):
             self.assert_same(result, line)
-        next(tavo.analyze_many(songs)).path  # not read to its end: the command ends too
+        next(tavo.analyze_many(songs)).path  # the command ends although not all results are read
 
     def test_module_is_the_command(self):
         for words in (["--version"], ["missing.wav"]):

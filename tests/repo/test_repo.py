@@ -1,6 +1,5 @@
-"""Checks the repository: folders include only folders below them, and the library exports and imports only the
-intended names.
-Each check is shown to fail. Arguments: the repository, the library."""
+"""Checks that folders include only folders below them, and that the library exports and imports only the intended
+names. Each check is also shown to fail. Arguments: the repository, the library."""
 import pathlib
 import re
 import subprocess
@@ -9,7 +8,7 @@ import tempfile
 import unittest
 
 ROOT, LIBRARY = (pathlib.Path(sys.argv.pop(1)) for _ in range(2))
-ALLOWED = {  # each folder and the folders below it that it may include
+ALLOWED = {  # for each folder, the folders that it may include
     "include": set(),
     "common": {"include"},
     "dsp": {"include", "common"},
@@ -24,11 +23,11 @@ ALLOWED = {  # each folder and the folders below it that it may include
     "cli": {"include"},
     "desktop": {"include"},
 }
-EXCEPTIONS = {  # exceptions: headers that a folder may include from other folders
+EXCEPTIONS = {  # other headers that a folder may include
     # The desktop implementation includes only the interface of the codec library.
     "desktop": {"android/log.h", "media_source/wexaaudio.h", "media_source/mtsrc_io.h"},
 }
-# The codecs of a package in this list would tie the library to that package.
+# The libraries that libtavo.so may need. It must not depend on a package with codecs.
 NEEDED = ("libwexaaudio.so", "liblog.so", "libc.so", "libm.so", "libstdc++.so", "libgcc_s.so", "libpthread.so",
           "ld-linux", "libasan.so", "libubsan.so", "libtsan.so")
 # Names that the compiler and the linker add; they differ between toolchains and sanitizers.
@@ -39,7 +38,7 @@ SPELLINGS = {"__errno_location": "__errno", "bcmp": "memcmp"}
 
 
 def includes(root):
-    """Yields each include of a folder's source: the folder, the file and the included path."""
+    """Yields each include of the project's sources: the folder, the file and the included path."""
     for folder in ALLOWED:
         for path in sorted((root / folder).rglob("*")):
             if path.suffix in (".h", ".cpp", ".c"):
@@ -58,8 +57,8 @@ def run(*command):
 
 
 def find_differences(library, names):
-    """Returns names that only the library or only the list has, needed libraries that are not in NEEDED, and
-    thread-local storage. Its first use in a loaded library allocates memory, which may fail."""
+    """Returns names that are only in the library or only in the list, and needed libraries that are not in NEEDED. Also
+    returns TLS for thread-local storage, whose first use allocates memory, which may fail."""
     symbols = run("nm", "-D", "--defined-only", library).splitlines()
     exported = [line.split()[-1].split("@")[0] for line in symbols if line.split()[1] != "A"]  # A: a symbol version
     needed = re.findall(r"\(NEEDED\).*\[(.*)\]", run("readelf", "-d", library))
@@ -85,8 +84,7 @@ class Repository(unittest.TestCase):
         self.assertEqual(find_wrong_includes(ROOT), [])
         for source, target, right in (
                 ("dsp/a.cpp", "dsp/b.h", True), ("dsp/a.cpp", "common/tavo_ctx.h", True),
-                ("dsp/a.cpp", "beat/b.h", False), ("highlight/a.h", "pcm/b.h", False),
-                ("media_source/a.cpp", "desktop/b.h", False), ("beat/a.cpp", "highlight/b.h", False),
+                ("dsp/a.cpp", "beat/b.h", False), ("beat/a.cpp", "highlight/b.h", False),
                 ("common/a.h", "include/tavo.h", True), ("include/tavo.h", "common/a.h", False),
                 ("core/a.cpp", "beat/b.h", True), ("core/a.cpp", "jni/b.h", False), ("java/a.cpp", "beat/b.h", False),
                 ("desktop/a.c", "include/tavo.h", True), ("cli/a.cpp", "media_source/mtsrc.h", False),
@@ -108,7 +106,7 @@ class Repository(unittest.TestCase):
         self.assertIn("libav", " ".join(find_differences(LIBRARY.parent / "libwexaaudio_av.so", [])))
 
     def test_imports(self):
-        """Checks that Android has every imported function."""
+        """Android has every function that the library imports."""
         known = words_of("tests/android/imports.txt")
         self.assertEqual(imports(LIBRARY) - {*known}, set())
         self.assertIn("pthread_create", imports(LIBRARY))

@@ -1,7 +1,6 @@
 // song_results SONGS [EXPECTED]: analyses every file in the directory SONGS in several ways and
-// prints the results as JSON, with all digits of milliseconds and BPM. With EXPECTED, the results
-// of another run, it prints only the differences. Exit status: 0; 1 for a difference or a song
-// without a result; 2 for wrong usage.
+// prints the results as JSON. If EXPECTED, the output of another run, is given, it prints only the
+// differences. The exit status is 1 if there is a difference or no song, and 2 for wrong usage.
 #include <filesystem>
 #include <fstream>
 #include <iostream>
@@ -16,7 +15,7 @@ using nlohmann::json;
 struct way {
     const char *name;
     int32_t mode;
-    int32_t length;  // of the highlight, seconds, or 0
+    int32_t length;  // requested length of the highlight in seconds, or 0
 };
 
 constexpr way kWays[] = {{"highlight", TAVO_MODE_HIGHLIGHT, 0},

@@ -1,7 +1,5 @@
 #include "tests/support/fake_codec.h"
 
-#include <malloc.h>
-
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
@@ -11,11 +9,11 @@ namespace fake_codec {
 namespace {
 
 constexpr size_t kMaxCalls = 1000;
-constexpr int kMaxReadsAfterEnd = 1000;  // with replace: a stream without an end is a failure
+constexpr int kMaxReadsAfterEnd = 1000;  // then reads fail, if `replace` hides the stream's end
 
 std::mutex mutex;
 
-// The compressed form of a frame, which refers to the frame.
+// The bytes that stand for a compressed frame. They point to the frame.
 struct compressed_frame {
     char magic[8] = "FCFRAME";
     const frame *original = nullptr;
@@ -27,7 +25,7 @@ void record_argument(const record *argument) {
     state.calls.back().records.push_back(argument ? bytes_of(*argument) : "");
 }
 
-// Records a call and its arguments. Returns the lock, which the caller holds until it returns.
+// Records a call and its arguments. The caller keeps the returned lock until it returns.
 template <typename... record>
 std::unique_lock<std::mutex> record_call(const char *name, const record *...arguments) {
     std::unique_lock<std::mutex> lock(mutex);
@@ -37,13 +35,13 @@ std::unique_lock<std::mutex> record_call(const char *name, const record *...argu
     return lock;
 }
 
-// Returns -1.
+// Records a misuse by the current call and returns -1.
 int32_t record_misuse(const std::string &reason) {
     state.misuses.push_back(state.calls.back().name + ": " + reason);
     return -1;
 }
 
-// Returns the value of that name that the current call reports.
+// Returns the value that the current call reports: the original or the test's replacement.
 template <typename number>
 number replace(const char *value, number original) {
     if (!state.replace) return original;
@@ -65,7 +63,7 @@ std::string kind_of_call() {
     return name.substr(0, name.find('_'));
 }
 
-// Returns the handle's object if it exists and is of that kind. Otherwise records a misuse and
+// Returns the object of a handle. If no object of that kind has the handle, records a misuse and
 // returns null.
 object *find_object(const void *handle, const std::string &kind = kind_of_call()) {
     for (object &each : state.objects) {
@@ -151,7 +149,7 @@ int32_t decode(const void *handle, const wexa_frame *input, wexa_output *output,
         memcpy(&compressed, bytes, sizeof compressed);
     }
     status->produced = 0;
-    // Anything else is the set-up data or an incomplete frame.
+    // Other bytes are the set-up data, which has no output, or an incomplete frame.
     if (strncmp(compressed.magic, compressed_frame().magic, 8) != 0) {
         return next_result(output->data ? -1 : 0);
     }
@@ -189,7 +187,7 @@ void *create_demuxer(info *record, int32_t *count) {
     return create_reader(record);
 }
 
-// Fills the record of a stream, of any type.
+// These functions fill the information record of a stream, whatever its type.
 template <typename info>
 void report_rate(info *record) {
     record->sample_rate = replace("rate", state.streams.back().sample_rate);
@@ -226,7 +224,7 @@ bool tags_are_empty() {
 
 using namespace fake_codec;
 
-// Functions with the same signature come from macros.
+// Macros define the functions that have the same signature.
 #define FAKE_READ(function)                                                                 \
     int32_t function(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first, \
                      int64_t *second) {                                                     \
@@ -308,7 +306,7 @@ FAKE_READ(xwavd_get_frm)
 FAKE_SEEK_WITH_FLAGS(xwavd_seek)
 FAKE_REMOVAL(xwavd_delete)
 
-// The record is filled even if the result is a failure.
+// The record is filled even if no reader is created.
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t *word) {
     const auto lock = record_call(__func__, io, word, info);
     report_rate_and_channels(info);
@@ -353,7 +351,6 @@ int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
     if (buf) {  // *length is its size
         reported = std::clamp(*length, 0, static_cast<int32_t>(setup.size()));
         memcpy(buf, setup.data(), static_cast<size_t>(reported));
-        state.calls.back().number = static_cast<int32_t>(malloc_usable_size(buf));
     }
     *length = replace("length", reported);
     return 0;

@@ -1,9 +1,9 @@
-// A fake codec library that behaves as a test specifies and records its calls. A test program that
-// links it calls these functions instead of those of libwexaaudio.so, and so does libtavo.so.
+// A fake codec library, which behaves as a test specifies and records its calls. In a program that
+// links it, the program and libtavo.so call these functions instead of those of libwexaaudio.so.
 //
-// A stream_spec describes one file: the contents of its information records and the frames that
-// every reader of the file returns, each with the PCM of its decoding. Each reader starts at the
-// first frame. Any thread may call the library; a test reads its state while no other thread does.
+// A stream_spec describes a file by its properties and its frames. Each reader of the file starts
+// at the first frame. Any thread may call the library, but a test may read the library's state only
+// while no other thread uses it.
 #ifndef TAVO_TESTS_SUPPORT_FAKE_CODEC_H
 #define TAVO_TESTS_SUPPORT_FAKE_CODEC_H
 
@@ -19,19 +19,19 @@
 
 namespace fake_codec {
 
-// One frame. For WAV it is a chunk whose bytes are pcm itself.
+// A frame and the samples that it decodes to. A WAV reader returns the samples themselves.
 struct frame {
     std::vector<int16_t> pcm = {};  // interleaved; what the decoder writes
-    int64_t start = 0;              // 100-ns units; the reader's first value
-    int32_t read_result = 0;        // 0 for a frame, 1 for the end, else failure
+    int64_t start = 0;              // start time, 100-ns units
+    int32_t read_result = 0;        // 0 for a frame, 1 for the end, otherwise a failure
     int32_t decode_result = 0;
-    int32_t produced = 1;                    // status of the decoding
-    std::optional<int32_t> bytes = {};       // reported by the decoder instead of pcm's size
-    std::optional<int32_t> read_bytes = {};  // reported by the reader instead of the true size
+    int32_t produced = 1;                    // the decoder's status
+    std::optional<int32_t> bytes = {};       // false size of the samples, reported by the decoder
+    std::optional<int32_t> read_bytes = {};  // false size of the frame, reported by the reader
 };
 
-// The reply to a seek. Without one, a seek moves to the last frame that starts at or before the
-// position.
+// The reply to a seek. A seek for which there is no reply moves to the last frame that starts at or
+// before the requested position.
 struct seek_reply {
     int32_t result = 0;
     std::optional<int64_t> reached = {};  // if empty, *reached is left unchanged
@@ -39,61 +39,62 @@ struct seek_reply {
 
 struct stream_spec {
     int32_t sample_rate = 44100, channels = 2, bits = 16;  // bits: only for WAV
-    std::optional<int32_t> codec = {};                     // if empty, the source's own
+    std::optional<int32_t> codec = {};                     // if empty, the usual one
     int64_t duration = 100'000'000;
     std::vector<int32_t> kinds = {kWexaKindAudio};  // of MP4 tracks or Ogg streams
-    std::optional<int32_t> kind_count = {};         // reported instead of kinds.size()
+    std::optional<int32_t> kind_count = {};         // false number of kinds
     std::vector<frame> frames = {};
-    frame last = {{}, 0, kWexaEndOfStream};    // read repeatedly after the frames
+    frame last = {{}, 0, kWexaEndOfStream};    // returned by every read after the frames
     std::vector<seek_reply> seeks = {};        // replies to the first seeks of each reader
     std::string setup = "123";                 // Vorbis set-up data
-    std::optional<int32_t> setup_length = {};  // reported instead of setup.size()
+    std::optional<int32_t> setup_length = {};  // false size of the set-up data
 };
 
-// A call with copies of the records that were passed, in the order of the arguments. Pointers to
-// numbers that the library only writes are not recorded.
-//   *_create of readers: io, word, information record; of decoders: configuration
+// A call, with copies of the records that were passed. They are recorded in this order:
+//   *_create of a reader: io, word, information record; of a decoder: configuration
 //   get_frm: none; seek: position, reached; get_info_aud: information record
-//   decode: frame, output, status, then the compressed bytes; xaacd_info: information, frame
+//   decode: frame, output, status, compressed bytes; xaacd_info: information, frame
 struct call {
     std::string name;
     int32_t number = 0;  // get_frm: size; seek: flags; xmp4fds_open, xoggds_open: index
     std::vector<std::string> records = {};
-    std::vector<const void *> addresses = {};  // of the same records
+    std::vector<const void *> addresses = {};  // where the records were
 };
 
-// Replaces a value that a call is about to return. Gets the names of the function and of the value.
-// Values: "result" of every function, before its other values (for a function that creates an
-// object, anything except 0 makes it return null); "bytes" and "first" of reads; "reached" of
-// seeks; "produced" and "bytes" of decodings; "rate", "channels", "bits", "codec", "duration",
-// "count", "kind" and "length" of records that describe the file. Called with the lock held.
+// Replaces a value that a function is about to report. `value` is the name of the value:
+//   "result": result of any function. An object is only created if it is 0.
+//   "bytes", "first": size and start time of a frame; "reached": position reached by a seek
+//   "produced", "bytes": the decoder's status and the size of its output
+//   "rate", "channels", "bits", "codec", "duration", "count", "kind", "length": properties of a
+//   file
+// The library holds its lock during the call.
 using replacement = int64_t (*)(const std::string &function, const std::string &value,
                                 int64_t original);
 
-// The object of a handle. reserved must come first: the FLAC source sets a flag there before every
-// read, and the read clears it.
+// The object of a handle. `reserved` must be the first field, because the FLAC source sets a flag
+// in it before every read. The read clears the flag.
 struct object {
     uint8_t reserved[4096] = {};
     std::string kind = {};  // for example "xaacfd", created by xaacfd_create
     const stream_spec *stream = nullptr;
-    const object *demux = nullptr;  // of a demuxer's stream
+    const object *demux = nullptr;  // the demuxer that opened this stream, if any
     size_t next_frame = 0;
-    size_t seeks = 0;         // replies used
-    int reads_after_end = 0;  // reads of the last frame
+    size_t seeks = 0;         // number of replies given
+    int reads_after_end = 0;  // number of reads after the frames
 };
 
 struct library_state {
     std::deque<stream_spec> streams = {stream_spec()};  // a new reader uses the last one
-    // Results of the next calls of a function, in order. Any result except 0 makes a function that
-    // creates an object return null.
+    // For each function, the results of its next calls. An object is only created if the result is
+    // 0.
     std::map<std::string, std::deque<int32_t>> results = {};
-    std::vector<call> calls = {};           // the latest ones; with replace, only the last
-    std::list<object> objects = {};         // created and not deleted
-    std::deque<wexa_tags> tags = {};        // returned, with all their buffers allocated
+    std::vector<call> calls = {};           // the latest calls; if `replace` is set, only the last
+    std::list<object> objects = {};         // the objects that exist
+    std::deque<wexa_tags> tags = {};        // all returned tags, with allocated buffers
     std::vector<std::string> misuses = {};  // wrong objects, double deletions, short buffers
     replacement replace = nullptr;
 };
-// Reset before each case (state = {}), when no object exists.
+// Each test starts with state = {}, when no object exists.
 inline library_state state;
 
 template <typename record>
@@ -103,7 +104,7 @@ std::string bytes_of(const record &value) {
 
 std::vector<call> calls_of(const std::string &part);  // calls whose names contain part
 std::string call_names();                             // each followed by a space
-bool tags_are_empty();  // true if all buffers of the returned tag records are freed
+bool tags_are_empty();  // true if the buffers of all returned tags were freed
 
 }  // namespace fake_codec
 

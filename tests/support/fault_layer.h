@@ -1,5 +1,6 @@
-// Makes calls of memory, thread, lock and file functions fail. The program links them with --wrap
-// and links the library's objects. Only calls from these objects are affected, on every thread.
+// Makes calls of memory, thread, lock and file functions fail, on any thread. Only calls from
+// objects that are linked into the program are affected, so the program links the library's
+// objects.
 #ifndef TAVO_TESTS_SUPPORT_FAULT_LAYER_H
 #define TAVO_TESTS_SUPPORT_FAULT_LAYER_H
 
@@ -21,14 +22,14 @@ enum call : uint32_t {
     kDup = 1 << 7,
     kRead = 1 << 8,
     kSeek = 1 << 9,
-    kClose = 1 << 10,  // closes the file and then fails
+    kClose = 1 << 10,  // the file is closed although the call fails
     kFopen = 1 << 11,
     kFwrite = 1 << 12,
 };
 
 struct plan {
-    uint32_t calls = kNothing;    // functions that are counted and fail
-    int64_t index = INT64_MAX;    // index of the call that fails; all threads are counted together
+    uint32_t calls = kNothing;    // functions whose calls are counted and may fail
+    int64_t index = INT64_MAX;    // index of the failing call among those of all threads
     bool forever = false;         // all later calls fail too
     int error = EIO;              // errno of a failed file function
     void (*on_call)() = nullptr;  // called before each counted call

@@ -2,9 +2,13 @@
 #ifndef TAVO_TESTS_SUPPORT_JOB_HARNESS_H
 #define TAVO_TESTS_SUPPORT_JOB_HARNESS_H
 
+#include <unistd.h>
+
 #include <algorithm>
 #include <cmath>
 #include <condition_variable>
+#include <csignal>
+#include <cstring>
 #include <mutex>
 #include <string>
 #include <vector>
@@ -25,7 +29,7 @@ struct result {
 inline std::mutex lock;
 inline std::condition_variable changed;
 inline result last;
-inline void (*during_callback)(TAVO_INFO *) = nullptr;  // called inside the callback
+inline void (*during_callback)(TAVO_INFO *) = nullptr;  // if set, the callback calls it
 
 inline void callback(TAVO_INFO *info) {
     if (during_callback != nullptr) during_callback(info);
@@ -45,8 +49,8 @@ inline result wait() {
     return last;
 }
 
-// Returns null if the result is consistent with its mode and status, otherwise the inconsistent
-// part.
+// Returns null if the result is consistent with its mode and status, otherwise the name of the
+// inconsistent part.
 inline const char *find_inconsistency(const result &found, int mode) {
     const auto &list = found.beats;
     const bool beats = found.status == 0 && mode != TAVO_MODE_HIGHLIGHT;
@@ -56,6 +60,18 @@ inline const char *find_inconsistency(const result &found, int mode) {
     if (beats != (found.beat_count > 0) || beats == found.null_beats) return "beats";
     if (!std::is_sorted(list.begin(), list.end())) return "order of the beats";
     return std::all_of(list.begin(), list.end(), finite) ? nullptr : "times of the beats";
+}
+
+inline char current_run[256];  // describes the run; printed if it crashes or takes too long
+
+// Lets current_run be printed if the program crashes or alarm() expires, which ends the program.
+inline void report_interruptions() {
+    for (const int number : {SIGALRM, SIGSEGV, SIGABRT}) {
+        signal(number, [](int) {
+            (void)!write(STDERR_FILENO, current_run, strlen(current_run));
+            _exit(3);
+        });
+    }
 }
 
 // Creates an instance and clears the previous result. No job may be running.

@@ -1,5 +1,4 @@
-// make_song OUT.wav [OPTION NUMBER]...
-// Writes a synthetic song with a quiet last sixth.
+// make_song OUT.wav [OPTION NUMBER]...: writes a synthetic song, whose last sixth is quiet.
 #include <cstdio>
 #include <map>
 

@@ -8,29 +8,27 @@ namespace support {
 namespace {
 
 constexpr double kTwoPi = 6.283185307179586;
-constexpr double kHitSeconds = 0.25;   // a hit is silent after this
-constexpr double kNoiseDecay = 0.008;  // seconds, of a stick: a short burst of noise
+constexpr double kHitSeconds = 0.25;   // length of a hit: a burst of noise and a low tone
+constexpr double kNoiseDecay = 0.008;  // seconds
 constexpr double kKickDecay = 0.06;    // seconds
 constexpr double kKickHz = 62.0;
 constexpr double kFirstHit = 0.5;   // seconds
 constexpr double kQuietGain = 0.2;  // outside the loud section
 constexpr double kChordBeats = 16.0;
-constexpr double kOtherChannels = 0.8;  // relative to the first channel's bed
-constexpr double kFloor =
-    0.0008;  // noise floor relative to full scale, which avoids digital silence and ties
+constexpr double kOtherChannels = 0.8;  // level of the bed relative to the first channel
+constexpr double kFloor = 0.0008;       // level of the noise floor, which avoids digital silence
 // The loud section starts with an accent of the bed and then swells. Without that, a loudness curve
 // of overlapping windows would have several equally steep steps near the entry.
 constexpr double kAccentSeconds = 0.3;
 constexpr double kAccent = 1.35;
 constexpr double kSwellSeconds = 4.0;
 constexpr double kSwell = 0.15;
-constexpr double kFadeSeconds =
-    0.01;  // duration of a change of the bed's gain, so that it does not click
+constexpr double kFadeSeconds = 0.01;  // the bed's gain changes over this time, without a click
 // Each chord consists of the second, third and fourth harmonic of its root, so the bed's spectrum
 // does not change.
 constexpr double kRootHz[4] = {110.0, 123.47, 98.0, 130.81};
 
-// A xorshift generator, uniform in [-1, 1). The state is never 0.
+// A xorshift generator of numbers from -1 to 1. The state is never 0.
 struct noise {
     uint32_t state;
     double next() {
@@ -60,14 +58,14 @@ double bed_gain_at(const song_spec &plan, double t) {
     return gain_at(plan, t) * (accent ? kAccent : 1.0);
 }
 
-// bed_gain_at without steps: the bed reaches a new gain after kFadeSeconds.
+// Returns the bed's gain without steps. It reaches a new value after kFadeSeconds.
 double faded_bed_gain_at(const song_spec &plan, double t) {
     double sum = 0.0;
     for (int k = 0; k < 4; ++k) sum += bed_gain_at(plan, t - kFadeSeconds * k / 4.0);
     return sum / 4.0;
 }
 
-// Adds the bed, which is saturated so that its ratio of loudness to peak is that of recorded music.
+// Adds the bed. Saturation gives it the ratio of loudness to peak that recorded music has.
 void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     noise random = seeded(plan.seed, 100U);
     double phase = random.next() * kTwoPi;
@@ -77,8 +75,7 @@ void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     const double chord_seconds = kChordBeats * 60.0 / plan.bpm;
     for (size_t i = 0; i < out.size(); ++i) {
         const double t = static_cast<double>(i) / plan.rate;
-        // Chords change on the grid of the hits. Adding one cycle of chords keeps the index
-        // positive.
+        // Chords change together with a hit. One added cycle of chords keeps the index positive.
         const double chord = (t - kFirstHit) / chord_seconds + 4.0;
         phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / plan.rate;
         const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
