@@ -144,8 +144,8 @@ double mean_ahead(const double *db) {
     return sum * 0.125;
 }
 
-// True if a rise starts in the block whose level is db[0]. An unmeasured block never qualifies: p60
-// would have to be kUnmeasured too, and then no earlier block could be quieter.
+// True if a rise starts in the block whose level is db[0]. An unmeasured block never qualifies: it
+// can exceed `loud` only if p60 is kUnmeasured as well, and then no earlier block can be quieter.
 bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     const double step = mean - kMeanStep;
     const double quiet = step < limits->mid ? step : limits->mid;

@@ -20,8 +20,8 @@ struct period_candidate {
     int32_t lag;  // period in analysis frames; 0 if nothing was found
 };
 
-// Finds the period that scores best together with its double. The score must exceed 0; if several
-// are equal, the shortest period wins.
+// Finds the lag with the best score, which combines the correlation at the lag and at twice the
+// lag. The score must exceed 0; if several are equal, the shortest lag wins.
 period_candidate best_of_two(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 2; ++k) {
@@ -31,7 +31,7 @@ period_candidate best_of_two(const double *r, int32_t lags) {
     return best;
 }
 
-// Finds the period that scores best together with its triple.
+// Does the same for each lag and three times the lag.
 period_candidate best_of_three(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 3; ++k) {

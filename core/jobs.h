@@ -2,8 +2,8 @@
 // tavo_analyze starts.
 //
 // Input: a TAVO_CTX with the arguments of tavo_analyze. Output: a TAVO_INFO, passed to the callback
-// exactly once, after the final state is set. Follows core/lifecycle.h and precedes the host's
-// callback, such as that of jni/tavo_jni.h.
+// exactly once, after the final state is set. Follows core/lifecycle.h; the callback belongs
+// to the host, for example to jni/tavo_jni.h.
 #ifndef TAVO_CORE_JOBS_H
 #define TAVO_CORE_JOBS_H
 

@@ -1,8 +1,8 @@
 // Starts and stops the job of an instance. Declares the lock and the condition that exist from the
 // creation of an instance to its release.
 //
-// Input: the calls of include/tavo.h. Output: a job of core/jobs.h on its own thread. Follows
-// core/instance.h and core/jobs.h and precedes the host.
+// Input: the host's calls (include/tavo.h). Output: a job (core/jobs.h) on its own thread. Follows
+// core/instance.h and precedes core/jobs.h.
 #ifndef TAVO_CORE_LIFECYCLE_H
 #define TAVO_CORE_LIFECYCLE_H
 

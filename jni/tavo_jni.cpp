@@ -185,8 +185,8 @@ jint init_failed(jint code) {
     return code;
 }
 
-// Called with the lock held, or inside an event while an instance is open. `chars` holds the
-// characters of `path`, or is null, and is released here.
+// Called with the lock held, or during an event while an instance is open. `chars` is the text of
+// `path` or null; this function releases it.
 jint init_locked(JNIEnv *env, jstring path, const char *chars, jint mode) {
     const bool is_open = load_pointer(&instance) != nullptr;
     int32_t err = TAVO_ERR_HANDLE;
@@ -309,7 +309,7 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject /*thiz
                                                      jint mode) {
     const char *chars = path != nullptr ? env->GetStringUTFChars(path, nullptr) : nullptr;
     if (chars == nullptr) env->ExceptionClear();
-    // Inside an event, the lock may be held by a deinit that waits for this thread.
+    // During an event, a deinit that waits for this thread may hold the lock.
     const bool takes_lock = !is_posting() || load_pointer(&instance) == nullptr;
     pthread_mutex_t *mutex = takes_lock ? lock_for_init() : nullptr;
     const jint result = init_locked(env, path, chars, mode);

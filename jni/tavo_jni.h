@@ -34,7 +34,7 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject thiz, 
                                                      jint mode);
 
 // Starts the job. Takes no lock, because the host calls it on the thread that calls init and
-// deinit. Returns 0 if the job was started or no instance exists, -1 if the job was not started.
+// deinit. Returns -1 if an instance is open but its job could not be started, otherwise 0.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *env, jobject thiz, jint hl_param,
                                                         jint max_beats, jint beat_param2);
 

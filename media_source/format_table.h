@@ -1,11 +1,11 @@
-// Maps a type code of recognition to the operations of its format source. Called by mtsrc.cpp.
+// Maps a file's type code to the operations of its format source. Called by mtsrc.cpp.
 #ifndef TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
 #define TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
 
 #include "media_source/mtsrc_ctx.h"
 
 struct format_ops {
-    int32_t type;  // type code of recognition
+    int32_t type;  // type code (mtsrc.h)
     int32_t (*open)(mtsrc_ctx *src);
     void (*close)(mtsrc_ctx *src);
     int32_t (*get_frm)(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);

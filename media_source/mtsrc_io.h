@@ -1,6 +1,6 @@
 /// @file
-/// File access of stage 1. The format probes and the codec library access the file only through the
-/// callbacks in mtsrc_io. The codec library is a separate binary, so the layout of mtsrc_io is
+/// File access for stage 1. The format probes and the codec library access the file only through
+/// the callbacks in mtsrc_io. The codec library is a separate binary, so the layout of mtsrc_io is
 /// fixed.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_IO_H
 #define TAVO_MEDIA_SOURCE_MTSRC_IO_H

@@ -1,4 +1,4 @@
-// Format source of bare AAC streams in ADTS or ADIF form.
+// Format source for bare AAC streams in ADTS or ADIF form.
 #include <cstdlib>
 
 #include "media_source/codecs.h"

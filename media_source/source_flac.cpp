@@ -1,4 +1,4 @@
-// Format source of FLAC files.
+// Format source for FLAC files.
 #include "media_source/codec_source.h"
 
 namespace {

@@ -1,4 +1,4 @@
-// Format source of bare MPEG audio streams, Layers I to III.
+// Format source for bare MPEG audio streams, Layers I to III.
 #include <algorithm>
 #include <cstring>
 

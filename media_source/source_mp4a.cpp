@@ -1,4 +1,4 @@
-// Format source of MP4 files whose first audio track is AAC or MPEG Layer III.
+// Format source for MP4 files whose first audio track is AAC or MPEG Layer III.
 #include <algorithm>
 
 #include "media_source/codecs.h"

@@ -1,4 +1,4 @@
-// Format source of Ogg files with Vorbis. The decoder receives the set-up data before the first
+// Format source for Ogg files with Vorbis. The decoder receives the set-up data before the first
 // frame and outputs one channel.
 #include <algorithm>
 #include <cstdlib>

@@ -1,4 +1,4 @@
-// Format source of RIFF WAVE files with 16-bit PCM, which need no decoder.
+// Format source for RIFF WAVE files with 16-bit PCM, which need no decoder.
 #include "common/tavo_ctx.h"
 #include "media_source/codec_source.h"
 #include "media_source/pcm_queue.h"

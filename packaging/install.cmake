@@ -6,8 +6,8 @@ install(FILES include/tavo.h DESTINATION ${headers_dir})
 install(TARGETS tavo EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}
   INCLUDES DESTINATION ${headers_dir})
 
-# A device brings these two libraries. On a desktop they are installed in a private folder, because their names are
-# too common for one that every program searches; Debian's android-liblog, for example, contains another liblog.
+# Devices already have these two libraries. Desktops get them in a private folder, because their names are too generic
+# for the system's library path: Debian's android-liblog, for example, contains another liblog.
 if(NOT ANDROID)
   install(TARGETS log wexaaudio EXPORT tavo DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)
   install(TARGETS wexaaudio_av DESTINATION ${CMAKE_INSTALL_LIBDIR}/tavo)  # wexaaudio loads it

@@ -7,7 +7,7 @@
 
 namespace {
 
-// Bytes to copy before their pages are released. Chunks end at huge-page boundaries.
+// Bytes copied at a time before their pages are released. Chunks end at huge-page boundaries.
 constexpr int64_t kChunkBytes = 2 << 20;
 
 // Returns the offset in dst[total] at which the segment's data belongs: the last offset above 0

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # scripts/test-fresh.sh [COMMAND]...
-# For use before a release, as root; takes an hour or more. Makes a bare Debian 12 root, clones the last commit into
-# it under /root and runs the README's first commands, or the COMMANDs. Mounts nothing of this machine: /proc is a
+# For use before a release, as root; takes an hour or more. Creates a bare Debian 12 root, clones the last commit into
+# it under /root and runs the README's first commands, or the COMMANDs. Mounts nothing from this machine: /proc is a
 # new mount, and /dev contains a few new device nodes.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."

@@ -1,4 +1,4 @@
-"""Runs the command tavo: python3 -m tavo."""
+"""Runs the tavo command: python3 -m tavo."""
 
 import os
 import sys

@@ -1,4 +1,4 @@
-"""Analyses many songs with the command tavo, which runs several at once in worker processes."""
+"""Analyses many songs with the tavo command, which runs several at once in worker processes."""
 
 from __future__ import annotations
 

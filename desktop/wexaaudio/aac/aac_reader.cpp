@@ -22,7 +22,7 @@ struct adts_header {
     int32_t bytes;  // of the compressed frame
 };
 
-// Parses the header at `offset`. Returns false if it is invalid or states several raw blocks.
+// Parses the header at `offset`. Returns false if it is invalid or announces several raw blocks.
 bool header_at(io_file *file, int64_t offset, adts_header *h) {
     const uint8_t *p = io_file_bytes(file, offset, kHeaderBytes);
     if (p == nullptr || p[0] != 0xFF || (p[1] & 0xF6) != 0xF0) return false;
@@ -87,8 +87,8 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
     return frames->count > 0 && !file->failed;
 }
 
-// Makes the configuration from the first frame's header and, if that does not state the channels,
-// from its raw block.
+// Builds the configuration from the first frame's header and, if the header does not specify the
+// channels, from the frame's raw block.
 bool make_config(io_file *file, const adts_header &first, const frame_entry &entry,
                  aac_config *config) {
     aac_config_make(config, first.object_type, first.rate_index, first.channels);

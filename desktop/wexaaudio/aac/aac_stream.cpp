@@ -85,7 +85,7 @@ void put_general(bit_writer *w, const aac_config &config) {
 // Without this, a decoder that starts at a frame without such data would never apply it. Does
 // nothing unless the object type is low complexity.
 void state_sbr(aac_config *config, bool parametric) {
-    // Twice the core's rate is three entries up in the table.
+    // Twice the core's rate is three entries earlier in the table.
     const int32_t extension = config->rate_index - 3;
     if (config->object_type != kAacLowComplexity || config->channels == 0 ||
         aac_rate_of_index(extension) != 2 * aac_rate_of_index(config->rate_index)) {

@@ -1,4 +1,4 @@
-// The AAC code that the ADTS reader and the MP4 demuxer share. It makes the AudioSpecificConfig,
+// The AAC code that the ADTS reader and the MP4 demuxer share. It builds the AudioSpecificConfig,
 // which a decoder needs before the raw blocks, and describes the stream of raw blocks, which all
 // decode to the same number of samples.
 //
@@ -27,7 +27,7 @@ struct aac_config {
 // Returns the sample rate in Hz for an index of the rate table; 0 for an invalid index.
 int32_t aac_rate_of_index(int32_t index);
 
-// Makes a configuration from the fields of a header. `channels` is from 0 to 15.
+// Builds a configuration from the fields of a header. `channels` is from 0 to 15.
 void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index, int32_t channels);
 
 // Completes a configuration with 0 channels from the program configuration element that starts the

@@ -68,8 +68,8 @@ uint32_t be32(io_file *file, int64_t offset) {
     return static_cast<uint32_t>(number(file, offset, 4));
 }
 
-// Reads the first box of a level and removes it from the level. A box that states too large a size
-// ends with the level. Returns false if no box is left.
+// Reads the first box of a level and removes it from the level. A box whose stated size is too
+// large ends with the level. Returns false if no box is left.
 bool next_box(io_file *file, span *level, box *b) {
     const int64_t left = level->to - level->from;
     if (left < 8 || level->boxes++ == kMaxBoxes) return false;
@@ -295,7 +295,7 @@ bool read_run(parser *p, span run, bool ours, int64_t base, uint32_t size, int64
 }
 
 // Reads all runs of one track of a fragment. The frames start at *offset, unless the fragment
-// states another offset. Moves *offset to their end.
+// specifies another offset. Moves *offset to their end.
 bool read_track_runs(parser *p, int64_t moof, span traf, int64_t *offset) {
     io_file *file = p->file;
     const span head = find(file, traf, name_of("tfhd"));

@@ -103,7 +103,7 @@ bool read_headers(ogg_scan *scan) {
     return scan->parser != nullptr;
 }
 
-// Adds a complete packet, which is a header or audio.
+// Adds a complete packet, either a header or audio.
 bool add_packet(ogg_scan *scan) {
     if (scan->headers < kVorbisHeaders) {
         if (scan->packet_bytes < kNameBytes) return false;

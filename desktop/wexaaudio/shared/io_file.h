@@ -1,4 +1,4 @@
-// File access of the readers. Each reader opens its own handle through the source's callbacks and
+// File access for the readers. Each reader opens its own handle through the source's callbacks and
 // reads at any offset through one buffer. Offsets and sizes are 64-bit.
 //
 // Input: mtsrc_io. Output: bytes at an offset. A file is used by one thread at a time.
