@@ -47,7 +47,7 @@ constexpr double kFullScale = 32767.0;  // full scale of TAVO_CTX.ana
 
 extern "C" {
 
-// The lock and condition that both worker groups of this folder share. They exist from __beat_init
+// The lock and condition that both worker groups in this folder share. They exist from __beat_init
 // to __tavo_deinit and are null otherwise.
 extern pthread_mutex_t *feat_mutex_mt;
 extern pthread_cond_t *feat_cond_mt;

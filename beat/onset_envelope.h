@@ -16,7 +16,7 @@ struct TAVO_ONSET_WORKER {
     pthread_t thread;
     const double *signal;     // [n]
     int64_t first;            // first analysis frame
-    int64_t last;             // last analysis frame, included
+    int64_t last;             // last analysis frame, inclusive
     float **spectrum;         // [F] rows of [N / 2], shared
     int32_t frame_size;       // N
     int32_t hop_size;         // H

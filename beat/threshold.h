@@ -12,7 +12,7 @@ struct TAVO_THRES_WORKER {
     double *thr;              // [F - 1] shared
     const double *onset_env;  // [F] read-only
     int64_t first;            // first index
-    int64_t last;             // last index, included
+    int64_t last;             // last index, inclusive
     int32_t window;           // length of the window in analysis frames
     int32_t percentile;       // 97
     double running_max;       // largest threshold written so far, initially 0

@@ -1,4 +1,4 @@
-// Checks sizes for overflow and allocates memory, for every folder of the library.
+// Checks sizes for overflow and allocates memory, for the whole library.
 //
 // Sizes are computed from durations and rates that files state. They are therefore 64-bit and
 // checked for overflow.
@@ -66,8 +66,8 @@ void advise_huge_pages(void *buffer, int64_t bytes);
 // Returns null if memory runs out.
 uint8_t *allocate_buffer(int64_t bytes);
 
-// Gives the whole pages between `begin` and `end`, which point into one heap buffer, back to the
-// system. The pages stay allocated and read as zeros. Returns the end of the last page released, or
+// Releases the memory of the whole pages between `begin` and `end`, which point into one heap
+// buffer. The pages stay allocated and read as zeros. Returns the end of the last page released, or
 // `begin` if the range holds no whole page.
 const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end);
 

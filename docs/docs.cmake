@@ -1,4 +1,4 @@
-# The target docs builds the API reference in docs/html of the build folder.
+# The docs target builds the API reference in docs/html in the build folder.
 find_program(DOXYGEN_PROGRAM doxygen)
 if(DOXYGEN_PROGRAM)
   configure_file(docs/Doxyfile.in docs/Doxyfile @ONLY)

@@ -20,14 +20,14 @@ static_assert(offsetof(PEAK_INFO, index) == 8 && sizeof(PEAK_INFO_F) == 8);
 extern "C" {
 
 // Finds the peaks of x[len], largest first, and drops each one within min_dist of a larger one.
-// Writes at most max_count peaks to `out`, or all if max_count is 0; `out` needs len / 2 entries at
-// most. Returns the number of peaks written.
+// Writes at most max_count peaks to `out`, or all if max_count is 0; `out` needs at most len / 2
+// entries. Returns the number of peaks written.
 int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_t max_count,
                          uint32_t *out);
 
 // If min_dist is 0, finds all peaks in ascending order. Otherwise, finds them largest first and
 // drops each one closer than min_dist to a larger one. Writes them to out[len / 2] and returns
-// their number.
+// how many it wrote.
 int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out);
 
 // First writes the peak nearest to each priority position, unless that is the last peak. Then

@@ -13,7 +13,7 @@ int compare_value(const void *a, const void *b);   // double, ascending
 int compare_fvalue(const void *a, const void *b);  // float, ascending
 int compare_ivalue(const void *a, const void *b);  // int32_t, ascending
 
-// Sorts a[lo .. hi], both ends included, in ascending order.
+// Sorts a[lo .. hi], both ends inclusive, in ascending order.
 void quickSort(int32_t lo, int32_t hi, double *a);
 
 // Moves a[lo] to its sorted position among a[lo .. hi] and returns that position.

@@ -1,6 +1,6 @@
 /* analyze_file FILE [SECONDS]: prints the format of a song, the start of its highlight, and the
- * tempo and the beats from there on. Times are in milliseconds. SECONDS is the highlight's wanted
- * length, 30 by default.
+ * tempo and the beats from there on. Times are in milliseconds. SECONDS is the requested
+ * length of the highlight, 30 by default.
  *
  * cc analyze_file.c -o analyze_file $(pkg-config --cflags --libs tavo)
  */

@@ -177,8 +177,8 @@ void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback);
 
 /** Stores a listener instead of a callback, and a pointer that is passed to the listener but not
  * otherwise used. Call it before tavo_analyze, on an instance that tavo_init returned. The last
- * call of tavo_setcallback or tavo_set_listener counts. A null listener removes the stored one.
- * Returns 0, or -4 for a bad handle, with nothing stored. */
+ * call of tavo_setcallback or tavo_set_listener takes effect. A null listener removes the stored
+ * one. Returns 0, or -4 for a bad handle, with nothing stored. */
 int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 
 /** Starts the one job of the instance on its own thread and returns immediately.
@@ -192,7 +192,7 @@ int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_beats, int32_t beat_param2);
 
 /** Stops a running job, waits until its callback has returned, and releases the instance. Decoding
- * and the highlight search run to their end before the job stops.
+ * and the highlight search run to completion before the job stops.
  * Returns 0, or -4 for a bad handle or a call from inside the callback, with nothing changed. */
 int32_t tavo_deinit(TAVO_CTX *ctx);
 

@@ -1,4 +1,4 @@
-# Packs the files of FOLDER, except build files, into the jar OUTPUT with MANIFEST. JAR is the program.
+# Packs the files of FOLDER, except build files, into the jar OUTPUT with MANIFEST. JAR is the jar tool.
 file(GLOB_RECURSE files RELATIVE ${FOLDER} ${FOLDER}/*)
 list(FILTER files EXCLUDE REGEX "CMakeLists|cmake$|\\.in$")
 set(arguments "")

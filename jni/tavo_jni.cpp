@@ -110,7 +110,7 @@ void delete_host(JNIEnv *env, host_refs *host) {
     free(host);
 }
 
-// Gives back one use of the references. The last user deletes them.
+// Decrements the use count of the references, and deletes them if it reaches 0.
 void release_host(JNIEnv *env, host_refs *host) {
     if (host == nullptr) return;
     pthread_mutex_lock(&host_mutex);

@@ -10,8 +10,9 @@
 
 // The function that adds a format's next frame to the queue, and its argument.
 struct pcm_fill {
-    // `frame_buf` has frm_buf_size bytes; more than that are free at q_wr. Returns 0 to be called
-    // again, even if it added nothing; kMtsrcEndOfStream; or a negative code, which ends the read.
+    // `frame_buf` has frm_buf_size bytes, and the queue has more than that free at q_wr. Returns 0
+    // to be called again, even if it added nothing; kMtsrcEndOfStream; or a negative code, which
+    // ends the read.
     int32_t (*step)(mtsrc_ctx *src, uint8_t *frame_buf, void *work);
     void *work;  // argument of step
 };

@@ -1,4 +1,4 @@
-# Rules of cmake --install. The public header is installed in include/tavo, which the CMake package and tavo.pc add to
+# Rules for cmake --install. The public header is installed in include/tavo, which the CMake package and tavo.pc add to
 # the include path. The installed files find each other by relative paths.
 set(headers_dir ${CMAKE_INSTALL_INCLUDEDIR}/tavo)
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/tavo)

@@ -18,8 +18,8 @@ int32_t tavo_get_from_here(TAVO_CTX *ctx, int64_t pos);
 
 // Looks in `pcm` for the audio that the segment's source delivers next. On entry, *off is the byte
 // offset where it is expected. Returns 0 and sets *off to the offset found; if it is not found,
-// returns -1 and leaves *off unchanged. Reads src, fmt, start and duration of the record. The last
-// two give the size of `pcm`, which is not checked if duration is 0.
+// returns -1 and leaves *off unchanged. Reads only src, fmt, start and duration from the record.
+// The last two determine the size of `pcm`, which is not checked if duration is 0.
 int32_t _compare_decoded(TAVO_DECSEG *seg, const int16_t *pcm, int64_t *off);
 }
 

@@ -18,7 +18,7 @@ struct RESAMPLE_PART {
     double *out;        // [out_count]
     float ratio;
     int64_t first;      // first output
-    int64_t end;        // end of the outputs, not included
+    int64_t end;        // end of the outputs, exclusive
     int64_t in_count;   // samples
     int64_t out_count;  // samples
     pthread_t thread;

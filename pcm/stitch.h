@@ -16,8 +16,8 @@ void stereo2mono(int16_t *dst, const int16_t *src, int32_t frames);
 }
 
 // Selects what happens to a segment's buffer once it is stitched. `kept` leaves the buffer
-// unchanged. `released` gives the pages of a large buffer, and those of its source's queue that
-// hold no PCM, back to the system; the buffer stays allocated and reads as zeros.
+// unchanged. `released` gives memory back to the system: the pages of a large buffer, and those of
+// its source's queue that hold no PCM. The buffer stays allocated and reads as zeros.
 enum class segment_pages { kept, released };
 
 // Returns the number of bytes in one second of PCM. Every segment except the first drops its first

@@ -2,7 +2,7 @@
 # scripts/fuzz.sh [--keep] SECONDS [TARGET]...
 # Runs each fuzzer (all five by default) for SECONDS. It starts from its corpus (fuzz/corpus/TARGET.tar.gz and
 # fuzz/corpus/TARGET) and, if its inputs are files, from the tests' short songs. An input that takes more than 2 s
-# fails. Stores the input of a failure in build/fuzz/findings. --keep then replaces the archive with the smallest set
+# fails. Stores each failing input in build/fuzz/findings. --keep then replaces the archive with the smallest set
 # of inputs below 6 KiB with the same coverage.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."

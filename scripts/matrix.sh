@@ -24,7 +24,7 @@ for line in "${builds[@]}"; do
   cmake --build "$build" --target song_results >"$build.log"
   run=()
   if [[ $name == valgrind ]]; then
-    # glibc's loader compares names eight bytes at a time, beyond the end of a short one.
+    # glibc's loader compares names eight bytes at a time and reads past the end of short ones.
     printf '{\n loader\n Memcheck:Addr8\n obj:*/ld-linux*\n obj:*/ld-linux*\n}\n' >"$build.supp"
     run=(valgrind --quiet --error-exitcode=99 --leak-check=full --suppressions="$build.supp")
   fi

@@ -2,7 +2,7 @@
 # scripts/test-package.sh
 # For use before a release, as root; takes a quarter of an hour. Builds the Debian packages twice, in two folders,
 # and compares their bytes. Runs lintian. Installs them with apt in a clean Debian 12, runs the command, the Python
-# package and the jar, builds a program, and removes the packages. Runs the command of the .tar.gz. Builds a wheel
+# package and the jar, builds a program, and removes the packages. Runs the command from the .tar.gz. Builds a wheel
 # and installs it in a virtual environment.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
@@ -58,7 +58,7 @@ mkdir "$root/try/debs"
 cp "$debs"/*.deb "$root/try/debs"
 rm "$root"/try/debs/*-dbgsym_*
 cp "${tar[0]}" "$root/try/tavo.tar.gz"
-# Makes a song with two hits per second, loud from 15 s on.
+# Creates a song with two hits per second, loud from 15 s on.
 ffmpeg -v error -f lavfi -i \
   'aevalsrc=sin(2*PI*220*t)*(0.1+0.6*gt(t\,15))*exp(-8*mod(t\,0.5)):d=40:s=44100' "$root/try/song.flac"
 without_time() { # the result without the processor time, which differs

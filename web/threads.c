@@ -1,5 +1,5 @@
-// Replaces the pthread functions on a page without threads. pthread_create runs the job's thread to
-// its end before it returns. Inside the job it fails, so the job does all the work itself.
+// Replaces the pthread functions, because the page has no threads. pthread_create runs the job to
+// completion before it returns. Inside the job it fails, so the job does all the work itself.
 #include <errno.h>
 #include <pthread.h>
 #include <setjmp.h>

@@ -4,7 +4,7 @@
     >>> song = tavo.analyze("song.mp3")
     >>> song.highlight_ms, song.tempo_bpm, song.beats[:3]
 
-analyze runs libtavo.so in this process, one song at a time. analyze_many runs the command tavo,
+analyze runs libtavo.so in this process, one song at a time. analyze_many runs the tavo command,
 which analyses several songs at once.
 """
 

@@ -18,7 +18,7 @@ MODES = ("highlight", "beats", "both")  # the index is the library's number
 class Result:
     """The result of one song. Times count from the start of the file.
 
-    path: the file as it was named; "" for samples.
+    path: the path as given; "" for samples.
     highlight_ms: start of the highlight in milliseconds; None in mode "beats".
     beats: times in seconds, ascending; float64, shape (beats,), read-only; empty in mode "highlight".
     tempo_bpm: tempo in beats per minute; in mode "both", that of the music from the highlight on; None in
@@ -58,7 +58,7 @@ class Result:
         return "".join(f"{time:.6f}\n" for time in self.beats)
 
     def to_jams(self) -> Dict[str, Any]:
-        """Returns the result as JAMS: beat and tempo annotations, and a tag_open "highlight" where it starts."""
+        """Returns the result as JAMS: beat and tempo annotations, and the start of the highlight as a tag_open."""
         annotations = []
         if self.tempo_bpm is not None:
             start = self.highlight_ms / 1000.0 if self.highlight_ms is not None else 0.0

@@ -23,7 +23,8 @@ constexpr uint32_t name_of(const char (&text)[5]) {
     return name;
 }
 
-// File offsets of a box's contents, or of a level: several boxes. Both are 0 for a missing box.
+// File offsets of a box's contents or of a level, which is a sequence of boxes. Both are 0 for a
+// missing box.
 struct span {
     int64_t from;
     int64_t to;
@@ -156,8 +157,8 @@ void read_codec(const parser &p, span stsd) {
     if (entry.name == name_of("mp4a") && esds.to > 0) read_esds(p, esds);
 }
 
-// Adds a frame unless it is empty. Returns false if memory runs out or the file is too small for so
-// many frames.
+// Adds a frame unless it is empty. Returns false if memory runs out or the file is too small for
+// that many frames.
 bool add_frame(parser *p, int64_t offset, int64_t bytes) {
     if (bytes == 0) return true;
     frame_index *frames = &p->info->frames;
@@ -166,7 +167,7 @@ bool add_frame(parser *p, int64_t offset, int64_t bytes) {
                         frame_index_add(frames, offset, static_cast<int32_t>(bytes), 0));
 }
 
-// Contents of a table box after version and flags. Tables are read side by side but may be far
+// Contents of a table box, after its version and flags. Tables are read side by side but may be far
 // apart in the file, so they are loaded into memory.
 struct table {
     uint8_t *data;  // owned; null if missing or too long, or if memory ran out
@@ -251,7 +252,7 @@ bool read_tables(parser *p, span stbl) {
     return ok;
 }
 
-// Reads the tracks' defaults for fragments from the box "mvex".
+// Reads the tracks' defaults for fragments from the "mvex" box.
 void read_defaults(parser *p, span mvex) {
     box trex = {};
     while (p->default_count < kMaxTracks && next_named(p->file, &mvex, name_of("trex"), &trex)) {

@@ -1,4 +1,4 @@
-// Reads what an MP4 file states about its tracks: the kind of each track and, for the first audio
+// Reads the description of an MP4 file's tracks: the kind of each track and, for the first audio
 // track, its codec and the offset of every frame. The offsets come from the tables of the movie box
 // and of its fragments. Edit lists are ignored.
 //

@@ -66,7 +66,7 @@ bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b) {
 
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes) {
     if (h->layer != 3) return false;
-    // Some encoders place the table as if there were no checksum.
+    // Some encoders place the info tag as if there were no checksum.
     const int32_t at = main_data_at(h);
     for (const int32_t place : {at, h->has_crc ? at - 2 : at}) {
         if (place + 4 <= bytes &&

@@ -21,13 +21,13 @@ struct mpeg_header {
     bool has_crc;      // two bytes follow the header
 };
 
-// Parses four bytes. Returns false if they are not a header or are one of free format.
+// Parses four bytes. Returns false if they are not a header or are a free-format header.
 bool mpeg_parse(const uint8_t *p, mpeg_header *h);
 
 // True if both frames may belong to the same stream: version, layer and rate are equal.
 bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
 
-// True if a stream's first frame contains an encoder's table (Xing, Info, VBRI) instead of music.
+// True if a stream's first frame is an encoder's info frame (Xing, Info, VBRI) instead of audio.
 // p[bytes] is the start of the frame.
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
 

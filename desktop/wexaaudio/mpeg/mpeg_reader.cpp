@@ -95,7 +95,7 @@ bool find_chain(mpeg_scan *s, mpeg_header *first) {
     return false;
 }
 
-// Finds the first frame of music, after any encoder's table.
+// Finds the first frame of audio. Skips an encoder's info frame at the start.
 bool find_start(mpeg_scan *s) {
     if (!find_chain(s, &s->head)) return false;
     s->started = true;

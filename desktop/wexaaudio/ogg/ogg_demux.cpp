@@ -201,7 +201,7 @@ bool add_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
 bool cut_end(ogg_scan *scan) {
     frame_index *packets = &scan->info->frames;
     if (!scan->has_base) return packets->count > 0;
-    // A final position before the end of the second-to-last page is damage and is ignored.
+    // A final position before the end of the second-to-last page indicates damage and is ignored.
     const int64_t end = std::max(scan->last_end, scan->page_end);
     for (int64_t i = packets->count - 1; i >= 0 && frame_index_end(packets) > end; --i) {
         frame_entry &entry = packets->entry[i];

@@ -9,7 +9,7 @@
 
 namespace {
 
-// Two changes in quick succession may get the same time of change. After this long they cannot.
+// Two changes in quick succession may get the same change time; changes this far apart cannot.
 constexpr time_t kSettled = 2;  // seconds
 
 struct cached_scan : stream_info {

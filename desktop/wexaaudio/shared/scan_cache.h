@@ -1,6 +1,6 @@
 // Caches the results of scanning files, because a job opens its file five times.
 //
-// A file is identified by the device, inode, size and time of change of its path, so a file that
+// A file is identified by the device, inode, size and change time of its path, so a file that
 // was replaced or written to is scanned again. The last result is kept for the next reader, unless
 // the file changed so recently that another change could go unnoticed. Readers whose callbacks do
 // not read the file at the path share nothing.

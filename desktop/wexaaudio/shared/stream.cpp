@@ -68,7 +68,7 @@ void stream_close(void *reader) {
     free(r);
 }
 
-// The stream of a container is the reader of the container itself.
+// A container's stream handle is the container's reader itself.
 void *stream_of_track(void *reader, int32_t track, void * /*reserved*/) {
     const auto *r = static_cast<stream_reader *>(reader);
     return track >= 0 && track == r->info->track ? reader : nullptr;

@@ -61,8 +61,9 @@ void read_format(wav_reader *r, const uint8_t *p, int64_t bytes) {
     }
 }
 
-// Locates the data. A writer that was interrupted leaves a size of 0 or of all ones, and a
-// truncated file states more than it has. In both cases the data is the rest of the file.
+// Locates the data. A writer that was interrupted leaves a size of 0 or all ones, and a
+// truncated file has less data than its header states. In both cases the data is the rest of the
+// file.
 void read_data(wav_reader *r, int64_t offset, uint32_t size) {
     const int64_t rest = r->file.size - offset;
     r->has_data = true;
@@ -99,8 +100,8 @@ bool read_chunks(wav_reader *r) {
     return true;
 }
 
-// Fills in the record, which also shows the source why a file is refused. Returns false and leaves
-// the record empty if the header is too damaged.
+// Fills in the record, from which the source also learns why a file is refused. Returns false and
+// leaves the record empty if the header is too damaged.
 bool fill_info(xwav_info *info, const wav_reader *r) {
     if (!r->has_format || r->channels == 0 || r->rate <= 0) return false;
     info->codec = r->tag == kTagPcm    ? kWexaPcm

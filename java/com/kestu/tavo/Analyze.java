@@ -9,7 +9,7 @@ import java.util.concurrent.CountDownLatch;
 
 /**
  * An example for desktop machines: analyses files from the command line and prints their highlight
- * and beats as the command {@code tavo} does. It is the main class of {@code tavo.jar}:
+ * and beats as the {@code tavo} command does. It is the main class of {@code tavo.jar}:
  *
  * <pre>{@code java -Djava.library.path=LIB -jar tavo.jar [options] FILE...}</pre>
  *
@@ -17,7 +17,7 @@ import java.util.concurrent.CountDownLatch;
  * {@code PREFIX/lib} after an installation, where the jar is
  * {@code PREFIX/share/java/tavo.jar}.
  *
- * <p>Exit status: 0 on success, 1 if a file failed, 2 for wrong usage.
+ * <p>Exit status: 0 on success, 1 if a file failed, 2 for a usage error.
  */
 public final class Analyze {
     private static final String USAGE =

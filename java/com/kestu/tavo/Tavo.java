@@ -24,9 +24,9 @@ import java.lang.ref.WeakReference;
  * several that take turns. {@code init} reads from the file and {@code deinit} waits for a running
  * job, so do not call them on a user-interface thread. Events arrive on a thread of the library.
  *
- * <p><b>Lifetime.</b> The library holds this object by a weak reference. Keep your own reference
- * until the event has arrived, or the event is lost. Only {@code deinit} releases the native
- * analysis: if an object is lost first, call {@code deinit} on the next one.
+ * <p><b>Lifetime.</b> The library holds only a weak reference to this object. Keep your own
+ * reference until the event has arrived; otherwise the event is lost. Only {@code deinit} releases
+ * the native analysis: if an object is lost first, call {@code deinit} on the next one.
  *
  * <p><b>Click track.</b> The modes with beats write a diagnostic WAV file into the working
  * directory unless {@link #disableClickTrack} was called. On Android the working directory is not
@@ -77,8 +77,8 @@ public final class Tavo implements AutoCloseable {
 
     /**
      * Stops the library from writing its diagnostic click track, a WAV file in the working
-     * directory that every analysis with beats overwrites. The call affects the whole process and
-     * cannot be undone. Make it before {@link #analyze}.
+     * directory that every analysis with beats overwrites. The effect is process-wide and
+     * cannot be undone. Call this method before {@link #analyze}.
      */
     public static native void disableClickTrack();
 
@@ -94,7 +94,7 @@ public final class Tavo implements AutoCloseable {
      * Returns true if the analysis decoded the file to its end. Otherwise the event is a
      * failure. The value is valid from the event until {@link #deinit}.
      *
-     * @return true if so; false otherwise, before the event, after a stop or without {@link #init}
+     * @return true if so; false if not, before the event, after a stop or without {@link #init}
      */
     public native boolean isComplete();
 
@@ -119,7 +119,7 @@ public final class Tavo implements AutoCloseable {
      * @param maxBeats maximum number of threshold-selected beats, 0 for no limit; not used in
      *     {@link #MODE_HIGHLIGHT}
      * @param reserved not used, 0
-     * @return 0 if started; -1 if not, for instance because it was started before; also 0 without
+     * @return 0 if started; -1 if not, for instance because it was already started; also 0 without
      *     {@code init}, but then nothing happens and no event follows
      */
     public native int analyze(int highlightSeconds, int maxBeats, int reserved);
