@@ -118,8 +118,8 @@ void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, flo
     free(blip);
 }
 
-// Memory is allocated before the file is created, so that a failure leaves no unfinished file. The
-// blips are generated afterwards, so that no time is spent on them if the file cannot be created.
+// Memory is allocated before the file is created so that a failure leaves no unfinished file. The
+// blips are generated afterwards so that no time is spent on them if the file cannot be created.
 void write_click_track(const TAVO_CTX *ctx) {
     if (fnamedec == nullptr || fnamedec[0] == '\0') return;
     const int64_t n = analysis_length(ctx);

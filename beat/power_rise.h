@@ -10,7 +10,7 @@
 extern "C" {
 
 // Sets flags[i] to 1 for each sample i where a rise starts. flags[n] must be zeroed. Returns the
-// number of rises, or TAVO_ERR_MEMORY, with no flag set, if memory runs out.
+// number of rises. If memory runs out, sets no flag and returns TAVO_ERR_MEMORY.
 int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n);
 }
 

@@ -77,7 +77,7 @@ void run_thres_worker(void *record) {
 }
 
 // Divides the indices that have a full window into four equal ranges. If no index has one, all
-// ranges are empty. An index on a boundary belongs to the earlier worker only, so that no two
+// ranges are empty. An index on a boundary belongs only to the earlier worker so that no two
 // threads write the same value.
 void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
                   TAVO_THRES_WORKER *workers, int32_t *done) {

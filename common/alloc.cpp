@@ -19,7 +19,7 @@ uintptr_t page_size() {
 
 void advise_huge_pages(void *buffer, int64_t bytes) {
     if (buffer == nullptr || bytes < kLargeBytes) return;
-    // Extend the range to whole pages, so that neighbouring buffers share huge pages and each
+    // Extend the range to whole pages so that neighbouring buffers share huge pages and each
     // buffer stays one mapping, which realloc can move. The advice does no harm to other data in
     // the first and last page.
     const uintptr_t page = page_size();

@@ -62,7 +62,7 @@ constexpr int64_t kLargeBytes = 4 << 20;  // the functions below pay off from th
 void advise_huge_pages(void *buffer, int64_t bytes);
 
 // Allocates at least one byte of uninitialised memory. The caller frees it. A large buffer starts
-// on a huge-page boundary, so that the allocator's header does not split the first huge page.
+// on a huge-page boundary so that the allocator's header does not split the first huge page.
 // Returns null if memory runs out.
 uint8_t *allocate_buffer(int64_t bytes);
 

@@ -35,7 +35,7 @@ void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *
     bool started[kMaxWorkers] = {};
     if (count > kMaxWorkers) count = kMaxWorkers;
 
-    // Clear all flags before the first thread starts, so that a quick worker does not see another
+    // Clear all flags before the first thread starts so that a quick worker does not see another
     // worker's stale flag.
     for (int32_t i = 0; i < count; ++i) done[i] = 0;
     for (int32_t i = 0; i < count; ++i) {

@@ -2,8 +2,8 @@
 // tavo_analyze starts.
 //
 // Input: a TAVO_CTX with the arguments of tavo_analyze. Output: a TAVO_INFO, passed to the callback
-// exactly once, after the final state is set. Follows core/lifecycle.h; the callback belongs
-// to the host, for example to jni/tavo_jni.h.
+// exactly once, after the final state is set. Follows core/lifecycle.h. The host provides
+// the callback; see for example jni/tavo_jni.h.
 #ifndef TAVO_CORE_JOBS_H
 #define TAVO_CORE_JOBS_H
 
@@ -18,7 +18,7 @@ void *analyzeOnsetFromeHi(void *arg);   // mode 2
 void *analyzeHighlight(void *arg);      // same as analyzeHighlightOnly, for direct calls
 
 // Runs only the beat analysis of an instance whose `ana` is filled, and reports the result. In mode
-// 2, shifts the beats by the highlight start. Returns TAVO_OK in all cases, after the callback. An
+// 2, shifts the beats by the highlight start. Always returns TAVO_OK, after the callback. An
 // instance without an onset context reports a failure.
 int32_t analyzeOnsetenv(TAVO_CTX *ctx);
 }

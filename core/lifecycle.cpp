@@ -31,7 +31,7 @@ void destroy_locks() {
     pthread_mutex_destroy(&tavo_mutex);
 }
 
-// Polls without sleeping, so that stopping takes no longer than the rest of the job. Yields, so
+// Polls without sleeping so that stopping takes no longer than the rest of the job. Yields so
 // that the job can run on a single processor.
 void poll_until_ended(const TAVO_CTX *ctx) {
     while (!has_ended(ctx)) sched_yield();
@@ -75,7 +75,7 @@ extern "C" int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_bea
         ctx->onset->beat_param2 = beat_param2;
     }
 
-    // Set before the thread exists, so that a quick job's final state is not overwritten.
+    // Set before the thread exists so that a quick job's final state is not overwritten.
     store_flag(&ctx->state, kStateRunning);
     if (pthread_create(&ctx->worker, nullptr, kJobs[ctx->mode], ctx) != 0) {
         ctx->worker = pthread_t{};

@@ -32,7 +32,7 @@ struct host_refs {
 pthread_mutex_t host_mutex = PTHREAD_MUTEX_INITIALIZER;
 host_refs *current_host = nullptr;  // guarded by host_mutex
 
-// tavo_jni_mutex points here after the first init. The mutex is static, so that its creation cannot
+// tavo_jni_mutex points here after the first init. The mutex is static so that its creation cannot
 // fail.
 pthread_mutex_t lifecycle_mutex = PTHREAD_MUTEX_INITIALIZER;
 

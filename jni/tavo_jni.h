@@ -39,10 +39,10 @@ JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_analyze(JNIEnv *env, jobject thi
                                                         jint max_beats, jint beat_param2);
 
 // Stops a running job and waits until its event has returned. Returns 0 if the instance was
-// released or did not exist, or -1, with nothing changed, if called during the event.
+// released or did not exist. During the event, changes nothing and returns -1.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_deinit(JNIEnv *env, jobject thiz);
 
-// Static. Sets fnamedec (include/tavo.h) to an empty path, so that no click track is written.
+// Static. Sets fnamedec (include/tavo.h) to an empty path so that no click track is written.
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *env, jclass host);
 
 // True if the job of the open instance decoded the file to its end (tavo_is_complete).

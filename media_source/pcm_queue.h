@@ -28,7 +28,7 @@ void pcm_queue_push(mtsrc_ctx *src, int32_t bytes);
 // which then keeps its bytes; TAVO_ERR_READ if no step adds anything; or a step's own code.
 int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pcm_fill &fill);
 
-// Gives the pages that hold no PCM back to the system. They stay allocated and read as zeros.
+// Releases the memory of the pages that hold no PCM. They stay allocated and read as zeros.
 void pcm_queue_release_pages(const mtsrc_ctx *src);
 
 // Reduce interleaved PCM to one channel: the first, or the mean of the first two. `dst` may equal

@@ -4,8 +4,8 @@
 //
 // Readers open the file through the callbacks of mtsrc_io. Numeric results are 0 on success,
 // kWexaEndOfStream at the end of the stream, and any other value on failure. Times are in 100-ns
-// units unless stated otherwise. Different sources use their objects on different threads at the
-// same time.
+// units unless stated otherwise. Different sources use their objects concurrently on different
+// threads.
 //
 // A "frame" is whatever the library's reader passes to its own decoder: compressed bytes, or PCM
 // that the reader has already decoded and the decoder only copies. A source looks only at the byte

@@ -1,4 +1,4 @@
-# Completion of the command tavo for bash.
+# Bash completion for the tavo command.
 _tavo() {
     local word=${COMP_WORDS[COMP_CWORD]} before=${COMP_WORDS[COMP_CWORD - 1]} i
     COMPREPLY=()

@@ -1,4 +1,4 @@
-# Completion of the command tavo for fish.
+# Fish completion for the tavo command.
 complete -c tavo -s h -d 'Print the names of the options and end'
 complete -c tavo -l help -d 'Explain the options and end'
 complete -c tavo -l version -d 'Print the version and end'

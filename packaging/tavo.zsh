@@ -1,5 +1,5 @@
 #compdef tavo
-# Completion of the command tavo for zsh.
+# Zsh completion for the tavo command.
 _arguments -s -S \
   '-h[print the names of the options and end]' \
   '--help[explain the options and end]' \

@@ -150,7 +150,7 @@ void tavo_decode_deinit(TAVO_CTX *ctx) {
 }
 
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start) {
-    // The caller has freed these buffers. Clear the pointers before anything can fail, so that the
+    // The caller has freed these buffers. Clear the pointers before anything can fail so that the
     // buffers are not freed again.
     ctx->pcm = nullptr;
     if (ctx->seg == nullptr) return TAVO_ERR_MEMORY;

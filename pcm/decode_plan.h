@@ -55,8 +55,8 @@ void tavo_decode_deinit(TAVO_CTX *ctx);
 
 // Plans the decoding from `start` (100-ns units) to the end of the stream, using the sources that
 // are already open. Allocates new segment buffers and a new pcm; the caller must have freed the old
-// ones. Returns 0, or TAVO_ERR_MEMORY, with the segment buffers freed, if memory runs out or
-// nothing is left to decode.
+// ones. Returns 0. If memory runs out or nothing is left to decode, frees the segment buffers and
+// returns TAVO_ERR_MEMORY.
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
 }
 

@@ -19,7 +19,7 @@ int64_t find_splice(const uint8_t *dst, int64_t total, const uint8_t *data, int6
 }
 
 // Copies `bytes` bytes from `data`, which points into the segment's buffer. Releases each chunk
-// after copying it, so that only one chunk is in memory twice.
+// after copying it so that only one chunk is in memory twice.
 void move_pages(const TAVO_DECSEG *seg, uint8_t *dst, const uint8_t *data, int64_t bytes) {
     const uint8_t *done = seg->buf;  // everything before this is released
     int64_t at = 0;

@@ -103,7 +103,7 @@ function add(files) {
   run();
 }
 
-// Shows the song on the same page as --report.
+// Shows the song with the page template of --report.
 function show(entry) {
   if (shown) URL.revokeObjectURL(shown.song.audio);
   shown = entry;

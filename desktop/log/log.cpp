@@ -30,7 +30,7 @@ extern "C" int __android_log_print(int prio, const char *tag, const char *fmt, .
     vsnprintf(text, sizeof(text), fmt, args);
     va_end(args);
 
-    // Drops the newlines at the end of a message, so that each message is one line.
+    // Drops the newlines at the end of a message so that each message is one line.
     size_t length = strlen(text);
     while (length > 0 && text[length - 1] == '\n') --length;
     fprintf(stderr, "%c/%s: %.*s\n", priority_letter(prio), tag, static_cast<int>(length), text);

@@ -11,7 +11,7 @@ constexpr int32_t kIoBlock = 65536;         // bytes read ahead
 constexpr int32_t kMaxLook = kIoBlock / 2;  // bytes that io_file_peek can guarantee
 
 struct io_file {
-    mtsrc_io io;        // a copy, so that deleting a reader does not need the caller's record
+    mtsrc_io io;        // a copy so that deleting a reader does not need the caller's record
     mtsrc_file *file;   // owned
     int64_t size;       // bytes, when the file was opened
     int64_t at;         // offset of the handle, or -1 if unknown

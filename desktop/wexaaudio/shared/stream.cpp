@@ -111,7 +111,7 @@ int32_t stream_seek(void *reader, const int64_t *position, int64_t *reached) {
     const int64_t end = delivered(info);
     const int64_t sample = seek_target(*position, end, info->rate);
     // The source drops samples only at time 0. Every other position, even in the first frame, gets
-    // a time other than 0, so that nothing is dropped twice.
+    // a time other than 0 so that nothing is dropped twice.
     const int64_t decoded = sample > 0 ? sample + info->delay : 0;
     const frame_index *frames = &info->frames;
     r->next = sample < end ? frame_index_find(frames, decoded) : frames->count;

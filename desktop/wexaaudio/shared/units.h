@@ -15,7 +15,7 @@ int64_t units_from_samples(int64_t sample, int32_t rate);
 // that starts at or after that time, or `end` if none does.
 int64_t seek_target(int64_t units, int64_t end, int32_t rate);
 
-// Returns the duration of a stream in 100-ns units, rounded up to a multiple of four, so that a
+// Returns the duration of a stream in 100-ns units, rounded up to a multiple of four so that a
 // quarter of the duration contains a quarter of the samples.
 int64_t units_of_duration(int64_t samples, int32_t rate);
 
