@@ -1,13 +1,23 @@
 #include "cli/store/database.h"
 
+#include <dlfcn.h>
+
 #include <cctype>
 #include <regex>
 #include <set>
 
 namespace {
 
-bool starts_with(const std::string &text, const std::string &start) {
-    return text.compare(0, start.size(), start) == 0;
+// Returns null if the program was built without PostgreSQL. The client library of PostgreSQL
+// depends on two dozen others, so the module that needs it is loaded on demand.
+const database_kind *postgresql_database() {
+    void *module = dlopen("libtavo_postgresql.so", RTLD_NOW | RTLD_LOCAL);
+    if (module == nullptr) return nullptr;
+    return static_cast<const database_kind *>(dlsym(module, "tavo_postgresql_database"));
+}
+
+bool starts_with(const std::string &text, const char *start) {
+    return text.rfind(start, 0) == 0;
 }
 
 bool ends_with(const std::string &text, const std::string &end) {
@@ -43,8 +53,7 @@ failure find_database(const std::string &url, const database_kind **kind, std::s
         return {
             "--store takes sqlite:FILE, a file that ends in .db, or postgresql://HOST/DATABASE."};
     }
-    if (*kind == nullptr) return {"This tavo was built without " + name + "."};
-    return {};
+    return {*kind == nullptr ? "This tavo was built without " + name + "." : ""};
 }
 
 std::string without_credentials(const std::string &text, const std::string &url) {

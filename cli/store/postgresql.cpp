@@ -1,6 +1,7 @@
+// The module with the client library of PostgreSQL.
 #include <libpq-fe.h>
 
-#include <cstdlib>
+#include <algorithm>
 #include <memory>
 #include <string_view>
 
@@ -8,15 +9,15 @@
 
 namespace {
 
-constexpr Oid kBytesOid = 17;  // of the server's types, fixed for all versions
-constexpr Oid kBigintOid = 20;
-constexpr Oid kIntegerOid = 23;
+constexpr Oid kBytesOid = 17;  // of the type BYTEA, fixed for all versions of the server
+
+using database = std::shared_ptr<PGconn>;
 
 // Returns the server's text on one line.
-std::string sentence(const char *words) {
-    std::string text = words;
+std::string message_of(const database &db) {
+    std::string text = PQerrorMessage(db.get());
     while (!text.empty() && text.back() == '\n') text.pop_back();
-    for (char &c : text) c = c == '\n' ? ' ' : c;
+    std::replace(text.begin(), text.end(), '\n', ' ');
     return text;
 }
 
@@ -31,59 +32,40 @@ bool is_permanent(const char *sql_state) {
     return true;
 }
 
-failure connect(const std::string &location, bool /*read_only*/, void **handle) {
-    PGconn *connection = PQconnectdb(location.c_str());
-    *handle = connection;
-    if (PQstatus(connection) != CONNECTION_OK) return {sentence(PQerrorMessage(connection))};
-    PQsetNoticeProcessor(
-        connection, [](void *, const char *) {}, nullptr);
-    return {};
-}
-
 cell column(const PGresult *result, int line, int index) {
-    if (PQgetisnull(result, line, index) != 0) return std::monostate();
+    if (PQgetisnull(result, line, index) != 0) return std::nullopt;
     const char *text = PQgetvalue(result, line, index);
-    const Oid type = PQftype(result, index);
-    if (type == kBigintOid || type == kIntegerOid) return int64_t{strtoll(text, nullptr, 10)};
-    if (type != kBytesOid) return std::string(text);
+    if (PQftype(result, index) != kBytesOid) return text;
     size_t size = 0;
     const std::unique_ptr<unsigned char, decltype(&PQfreemem)> raw(
         PQunescapeBytea(reinterpret_cast<const unsigned char *>(text), &size), PQfreemem);
-    return raw == nullptr ? bytes{}
-                          : bytes{std::string(reinterpret_cast<const char *>(raw.get()), size)};
+    if (raw == nullptr) return std::nullopt;
+    return std::string(reinterpret_cast<const char *>(raw.get()), size);
 }
 
-failure run(void *handle, const std::string &sql, const row &values,
-            const std::function<void(const row &)> &on_row) {
-    auto *connection = static_cast<PGconn *>(handle);
-    // Values in the protocol's format: numbers and text as text, bytes unchanged.
-    std::vector<std::string> texts(values.size());
-    std::vector<const char *> data(values.size());
-    std::vector<int> sizes(values.size());
+failure run(const database &db, const std::string &sql, const row &values,
+            const row_reader &on_row) {
+    std::vector<const char *> data;
+    std::vector<int> sizes;
+    for (const cell &value : values) {
+        data.push_back(value ? value->data() : nullptr);
+        sizes.push_back(value ? static_cast<int>(value->size()) : 0);
+    }
+    // The path is sent as bytes, the other values as text. The server finds out their types.
     std::vector<int> formats(values.size());
     std::vector<Oid> types(values.size());
-    for (size_t i = 0; i < values.size(); ++i) {
-        const auto *number = std::get_if<int64_t>(&values[i]);
-        const auto *text = std::get_if<std::string>(&values[i]);
-        const auto *blob = std::get_if<bytes>(&values[i]);
-        if (number != nullptr) texts[i] = std::to_string(*number);
-        if (text != nullptr) texts[i] = *text;
-        if (blob != nullptr) texts[i] = blob->value;
-        const bool is_null = std::holds_alternative<std::monostate>(values[i]);
-        data[i] = is_null ? nullptr : texts[i].data();
-        sizes[i] = static_cast<int>(texts[i].size());
-        formats[i] = blob != nullptr ? 1 : 0;
-        types[i] = blob != nullptr ? kBytesOid : 0;
+    if (!values.empty()) {
+        formats[0] = 1;
+        types[0] = kBytesOid;
     }
     const std::unique_ptr<PGresult, decltype(&PQclear)> result(
-        values.empty() ? PQexec(connection, sql.c_str())
-                       : PQexecParams(connection, sql.c_str(), static_cast<int>(values.size()),
+        values.empty() ? PQexec(db.get(), sql.c_str())
+                       : PQexecParams(db.get(), sql.c_str(), static_cast<int>(values.size()),
                                       types.data(), data.data(), sizes.data(), formats.data(), 0),
         PQclear);
     const ExecStatusType status = PQresultStatus(result.get());
     if (status != PGRES_COMMAND_OK && status != PGRES_TUPLES_OK) {
-        return {sentence(PQerrorMessage(connection)),
-                is_permanent(PQresultErrorField(result.get(), PG_DIAG_SQLSTATE))};
+        return {message_of(db), is_permanent(PQresultErrorField(result.get(), PG_DIAG_SQLSTATE))};
     }
     for (int line = 0; on_row && line < PQntuples(result.get()); ++line) {
         row found;
@@ -95,22 +77,25 @@ failure run(void *handle, const std::string &sql, const row &values,
     return {};
 }
 
-void disconnect(void *handle) {
-    PQfinish(static_cast<PGconn *>(handle));
+failure open_server(const std::string &location, bool /*read_only*/, connection &out) {
+    const database db(PQconnectdb(location.c_str()), PQfinish);
+    if (PQstatus(db.get()) != CONNECTION_OK) return {message_of(db)};
+    PQsetNoticeProcessor(
+        db.get(), [](void *, const char *) {}, nullptr);
+    out = [db](const std::string &sql, const row &values, const row_reader &on_row) {
+        return run(db, sql, values, on_row);
+    };
+    return {};
 }
 
-// An index entry is limited to a third of a page of 8 KiB.
-constexpr database_kind kPostgresql = {
-    "BYTEA", "TIMESTAMPTZ", "date_trunc('second', now())", "JSON", 2600,
+}  // namespace
+
+// Looked up by name in this module. The limit of a path follows from that of an index entry, a
+// third of a page of 8 KiB.
+extern "C" const database_kind tavo_postgresql_database = {
+    "BYTEA", "TIMESTAMPTZ", "JSON", "date_trunc('second', now())", 2600,
     // Reading pg_class makes the server notice a table that another command has just created.
     "SELECT coalesce((SELECT substring(obj_description(oid, 'pg_class') FROM 'version ([0-9]+)') "
     "FROM pg_class WHERE oid = to_regclass('songs')), '0')::int",
     "COMMENT ON TABLE songs IS 'tavo, version %d'",
-    "BEGIN; SELECT pg_advisory_xact_lock(hashtext('tavo songs'))", connect, run, disconnect};
-
-}  // namespace
-
-// Looked up by name in this module.
-extern "C" const database_kind *tavo_postgresql_database() {
-    return &kPostgresql;
-}
+    "BEGIN; SELECT pg_advisory_xact_lock(hashtext('tavo songs'))", open_server};

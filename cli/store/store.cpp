@@ -5,16 +5,17 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
+#include <array>
+#include <nlohmann/json.hpp>
 
 #include "cli/run/stop.h"
-#include "cli/store/songs_table.h"
 #include "cli/system.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
 namespace {
 
+using nlohmann::json;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 
@@ -22,29 +23,148 @@ constexpr size_t kBatchRows = 100;
 constexpr milliseconds kBatchAge{2000};
 constexpr int64_t kFirstWaitMs = 500;  // doubled each time
 constexpr int64_t kLongestWaitMs = 30'000;
-constexpr int64_t kPageRows = 500;
 
-// Returns the four values of the key, in order.
-row key_of(const store &db, const std::string &path) {
-    return {bytes{path}, std::string(mode_word(db.opts.mode)), int64_t{db.opts.length_s},
-            int64_t{db.opts.max_beats}};
+// ---- The table and its SQL.
+
+// Version 2 added offset_ms and decoder. A table without a version (0) has the columns of
+// version 1.
+constexpr int kTableVersion = 2;
+constexpr size_t kAddedColumns = 2;
+
+enum class column_type { text, whole, real, list };  // list: of numbers, as JSON
+
+// A column for a part of the result, and the part's key in JSON.
+struct result_column {
+    const char *name;
+    const char *key;
+    column_type type;
+};
+constexpr result_column kResultColumns[] = {
+    {"status", "status", column_type::text},
+    {"sentence", "error", column_type::text},
+    {"sample_rate", "sample_rate", column_type::whole},
+    {"channels", "channels", column_type::whole},
+    {"duration_ms", "duration_ms", column_type::whole},
+    {"hl_pos_ms", "hl_pos_ms", column_type::whole},
+    {"hl_end_ms", "hl_end_ms", column_type::whole},
+    {"hl_refined", "hl_refined", column_type::whole},
+    {"bpm", "bpm", column_type::whole},
+    {"beats_ms", "beats_ms", column_type::list},
+    {"cpu_ms", "cpu_ms", column_type::whole},
+    {"offset_ms", "offset_ms", column_type::real},
+    {"decoder", "decoder", column_type::text},
+};
+constexpr const char *kKey = "path, mode, length_s, max_beats";
+
+// Values: the key, the size and the time of change, $1 to $6.
+constexpr const char *kStatusQuery =
+    "SELECT status FROM songs WHERE path = $1 AND mode = $2 AND length_s = $3 AND max_beats = $4 "
+    "AND size = $5 AND mtime_ns = $6";
+
+// Returns the statements that create the table or add missing columns to an older one, and set the
+// version.
+std::vector<std::string> upgrade_statements(const database_kind &kind) {
+    const std::string table =
+        "CREATE TABLE IF NOT EXISTS songs (path " + std::string(kind.path_type) +
+        " NOT NULL, mode TEXT NOT NULL, length_s INTEGER NOT NULL, max_beats INTEGER NOT NULL, "
+        "size BIGINT NOT NULL, mtime_ns BIGINT NOT NULL, status TEXT NOT NULL, sentence TEXT, "
+        "sample_rate INTEGER, channels INTEGER, duration_ms BIGINT, hl_pos_ms INTEGER, hl_end_ms "
+        "BIGINT, hl_refined INTEGER, bpm INTEGER, beats_ms " +
+        kind.list_type + ", cpu_ms BIGINT, version TEXT NOT NULL, host TEXT NOT NULL, finished " +
+        kind.time_type + " NOT NULL, PRIMARY KEY (" + kKey + "))";
+    return {table, "ALTER TABLE songs ADD COLUMN offset_ms DOUBLE PRECISION",
+            "ALTER TABLE songs ADD COLUMN decoder TEXT",
+            formatted(kind.set_version, kTableVersion)};
 }
 
-failure run(const store &db, const std::string &sql, const row &values = {},
-            const std::function<void(const row &)> &on_row = nullptr) {
-    return db.kind->run(db.handle, sql, values, on_row);
+// Returns the statement that inserts a row or replaces the one with its key. Its values are those
+// of the key, the size and the time of change, and the cells of append_result_cells.
+std::string put_statement(const database_kind &kind) {
+    std::vector<std::string> others = {"size", "mtime_ns"};
+    for (const result_column &column : kResultColumns) others.emplace_back(column.name);
+    others.insert(others.end(), {"version", "host"});
+    std::string names = kKey;
+    std::string values = "$1, $2, $3, $4";
+    std::string changes = "finished = excluded.finished";
+    for (size_t i = 0; i < others.size(); ++i) {
+        names += ", " + others[i];
+        values += ", $" + std::to_string(i + 5);
+        changes += ", " + others[i] + " = excluded." + others[i];
+    }
+    return "INSERT INTO songs (" + names + ", finished) VALUES (" + values + ", " + kind.time_now +
+           ") ON CONFLICT (" + kKey + ") DO UPDATE SET " + changes;
 }
 
-void disconnect(store &db) {
-    if (db.handle != nullptr) db.kind->close(db.handle);
-    db.handle = nullptr;
+// Returns the query for the songs after a path, in the order of their paths. Its values are the key
+// with that path, $1 to $4, and the status, $5.
+std::string page_query(int version) {
+    const size_t count = std::size(kResultColumns) - (version < kTableVersion ? kAddedColumns : 0);
+    std::string columns = "path";
+    for (size_t i = 0; i < count; ++i) columns += std::string(", ") + kResultColumns[i].name;
+    return "SELECT " + columns +
+           " FROM songs WHERE path > $1 AND mode = $2 AND length_s = $3 AND max_beats = $4 AND "
+           "status = $5 ORDER BY path LIMIT 500";
 }
+
+// ---- Conversion between rows and JSON.
+
+cell cell_of(const json &result, const char *key) {
+    const auto found = result.find(key);
+    if (found == result.end()) return std::nullopt;
+    if (found->is_boolean()) return found->get<bool>() ? "1" : "0";
+    return found->is_string() ? found->get<std::string>() : found->dump();
+}
+
+void append_result_cells(row &cells, const std::string &text) {
+    const json result = json::parse(text);
+    for (const result_column &column : kResultColumns) {
+        cells.push_back(cell_of(result, column.key));
+    }
+    std::array<char, 256> host{};
+    gethostname(host.data(), host.size() - 1);
+    cells.insert(cells.end(), {TAVO_VERSION, as_utf8(host.data())});
+}
+
+bool is_number(const json &value) {
+    return value.is_number();
+}
+
+// Reads the text of a cell as JSON. Returns false if it is damaged.
+bool read_value(const std::string &text, column_type type, json &value) {
+    if (type == column_type::text) {
+        value = as_utf8(text);
+        return true;
+    }
+    // Nested lists are not parsed, so that their depth has no cost.
+    const size_t last_bracket = text.find_last_of("[{");
+    if (last_bracket != std::string::npos && last_bracket > 0) return false;
+    value = json::parse(text, nullptr, false);
+    if (type == column_type::whole) return value.is_number_integer();
+    if (type == column_type::real) return value.is_number();
+    return value.is_array() && std::all_of(value.begin(), value.end(), is_number);
+}
+
+// Reads a row of page_query. The result lacks the file's name.
+stored_song song_of(const row &cells, int32_t mode) {
+    stored_song song;
+    song.path = cells[0].value_or("");
+    json object = {{"mode", mode_word(mode)}};
+    for (size_t i = 1; i < cells.size(); ++i) {
+        const result_column &column = kResultColumns[i - 1];
+        if (!cells[i] || read_value(*cells[i], column.type, object[column.key])) continue;
+        song.damage = {std::string("Its row in the store is damaged: ") + column.name +
+                       " cannot be read."};
+        return song;
+    }
+    if (object.contains("bpm") && !object.contains("beats_ms")) object["beats_ms"] = json::array();
+    song.result = object.dump();
+    return song;
+}
+
+// ---- The connection.
 
 failure connect(store &db) {
-    if (db.handle != nullptr) return {};
-    failure failed = db.kind->open(db.location, db.opts.from_store, &db.handle);
-    if (failed) disconnect(db);
-    return failed;
+    return db.run ? failure() : db.kind->open(db.location, db.opts.from_store, db.run);
 }
 
 std::string public_text(const store &db, const failure &failed) {
@@ -58,7 +178,7 @@ failure persist(store &db, const std::function<failure()> &work) {
         failure failed = connect(db);
         if (!failed) failed = work();
         if (!failed) return {};
-        disconnect(db);
+        db.run = nullptr;
         const auto left = std::chrono::seconds(db.opts.patience_s) - (steady_clock::now() - start);
         const int64_t left_ms = std::chrono::duration_cast<milliseconds>(left).count();
         const std::string reason = public_text(db, failed);
@@ -77,26 +197,21 @@ failure persist(store &db, const std::function<failure()> &work) {
 }
 
 failure read_version(store &db) {
-    db.version = 0;
-    return run(db, db.kind->version_query, {}, [&](const row &cells) {
-        if (const auto *number = std::get_if<int64_t>(&cells[0])) {
-            db.version = static_cast<int>(*number);
-        }
+    return db.run(db.kind->version_query, {}, [&](const row &cells) {
+        db.version = static_cast<int>(strtol(cells[0].value_or("0").c_str(), nullptr, 10));
     });
 }
 
 // Creates the table or adds missing columns, in one transaction.
 failure upgrade(store &db) {
-    failure failed = run(db, db.kind->begin_upgrade);
+    failure failed = db.run(db.kind->begin_upgrade, {}, nullptr);
     if (!failed) failed = read_version(db);  // another command may have upgraded it meanwhile
     if (!failed && db.version < kTableVersion) {
         for (const std::string &statement : upgrade_statements(*db.kind)) {
-            if (!failed) failed = run(db, statement);
+            if (!failed) failed = db.run(statement, {}, nullptr);
         }
     }
-    if (!failed) failed = run(db, "COMMIT");
-    if (failed) disconnect(db);  // which rolls back
-    return failed;
+    return failed ? failed : db.run("COMMIT", {}, nullptr);
 }
 
 failure open_table(store &db) {
@@ -106,16 +221,30 @@ failure open_table(store &db) {
     return db.opts.from_store || db.version == kTableVersion ? failure() : upgrade(db);
 }
 
+// ---- Batches and pages.
+
+// Returns the four values of the key, in order.
+row key_of(const store &db, const std::string &path) {
+    return {path, mode_word(db.opts.mode), std::to_string(db.opts.length_s),
+            std::to_string(db.opts.max_beats)};
+}
+
+// The same, followed by the size and the time of change.
+row values_of(const store &db, const std::string &path, const file_state &file) {
+    row values = key_of(db, path);
+    values.insert(values.end(), {std::to_string(file.size), std::to_string(file.mtime_ns)});
+    return values;
+}
+
 failure write_batch(const store &db) {
     const std::string sql = put_statement(*db.kind);
-    if (failure failed = run(db, "BEGIN")) return failed;
+    if (failure failed = db.run("BEGIN", {}, nullptr)) return failed;
     for (const stored_song &song : db.batch) {
-        row cells = key_of(db, song.path);
-        cells.insert(cells.end(), {song.file.size, song.file.mtime_ns});
-        append_result_cells(cells, song.result);
-        if (failure failed = run(db, sql, cells)) return failed;
+        row values = values_of(db, song.path, song.file);
+        append_result_cells(values, song.result);
+        if (failure failed = db.run(sql, values, nullptr)) return failed;
     }
-    return run(db, "COMMIT");
+    return db.run("COMMIT", {}, nullptr);
 }
 
 failure commit_batch(store &db) {
@@ -130,12 +259,9 @@ failure read_page(store &db) {
     return persist(db, [&] {
         db.page.clear();
         row values = key_of(db, db.last_path);
-        values.insert(values.end(), {std::string(db.opts.failed ? "failed" : "ok"), kPageRows});
-        return run(db, page_query(db.version), values, [&](const row &cells) {
-            db.page.emplace_back();
-            stored_song &song = db.page.back();
-            song.damage = read_result_cells(cells, mode_word(db.opts.mode), song.path, song.result);
-        });
+        values.emplace_back(db.opts.failed ? "failed" : "ok");
+        return db.run(page_query(db.version), values,
+                      [&](const row &cells) { db.page.push_back(song_of(cells, db.opts.mode)); });
     });
 }
 
@@ -154,47 +280,31 @@ std::string summary_text(const store &db) {
 
 }  // namespace
 
-int read_file_state(const std::string &path, file_state &state) {
-    struct stat info {};
-    if (stat(path.c_str(), &info) != 0) return errno;
-    state.size = info.st_size;
-    state.mtime_ns = int64_t{info.st_mtim.tv_sec} * 1'000'000'000 + info.st_mtim.tv_nsec;
-    return 0;
-}
-
 failure open_store(store &db, const options &opts) {
     if (opts.store.empty()) return {};
     db.opts = opts;
-    if (failure failed = find_database(opts.store, &db.kind, db.location)) {
-        db.kind = nullptr;
-        return failed;
-    }
+    if (failure failed = find_database(opts.store, &db.kind, db.location)) return failed;
     const failure failed = open_table(db);
     if (!failed) return {};
-    const std::string text = public_text(db, failed);
-    disconnect(db);
-    db.kind = nullptr;
-    return {"The store cannot be used: " + text + "."};
+    return {"The store cannot be used: " + public_text(db, failed) + "."};
 }
 
 failure find_song(store &db, const std::string &path, file_state &file, bool &is_new) {
     is_new = true;
-    if (db.kind == nullptr || db.has_failed) return {};
-    if (read_file_state(path, file) != 0 || db.opts.redo) return {};
+    struct stat info {};
+    if (db.kind == nullptr || db.has_failed || stat(path.c_str(), &info) != 0) return {};
+    file.size = info.st_size;
+    file.mtime_ns = int64_t{info.st_mtim.tv_sec} * 1'000'000'000 + info.st_mtim.tv_nsec;
+    if (db.opts.redo) return {};
     std::string status;
     failure failed = persist(db, [&] {
-        row values = key_of(db, path);
-        values.insert(values.end(), {file.size, file.mtime_ns});
-        return run(db, kStatusQuery, values, [&](const row &cells) {
-            const auto *text = std::get_if<std::string>(&cells[0]);
-            status = text != nullptr ? *text : "damaged";
-        });
+        return db.run(kStatusQuery, values_of(db, path, file),
+                      [&](const row &cells) { status = cells[0].value_or(""); });
     });
     const bool is_failed = status == "failed";
-    if (status.empty() || status == "damaged" || (is_failed && db.opts.retry_failed)) return failed;
-    is_new = false;
-    ++db.known;
-    db.known_failed += is_failed ? 1 : 0;
+    is_new = status.empty() || (is_failed && db.opts.retry_failed);
+    if (!is_new) ++db.known;
+    if (!is_new && is_failed) ++db.known_failed;
     return failed;
 }
 
@@ -234,12 +344,7 @@ failure read_next(store &db, stored_song &song, bool &found) {
 failure close_store(store &db, std::string &summary) {
     if (db.kind == nullptr) return {};
     failure failed = commit_batch(db);
-    for (const stored_song &song : db.batch) {
-        write_all(STDOUT_FILENO, song.result);
-    }
+    for (const stored_song &song : db.batch) write_all(STDOUT_FILENO, song.result);
     if ((!db.opts.quiet && !db.opts.from_store) || !db.batch.empty()) summary = summary_text(db);
-    disconnect(db);
-    db.batch.clear();
-    db.kind = nullptr;
     return failed;
 }

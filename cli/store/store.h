@@ -1,9 +1,9 @@
-// Results in a database: --store.
+// Results in a database: --store. Several commands may share one store. Without --store every
+// function does nothing.
 //
-// In: results as JSON (format.h), in the command's own process. Out: one row per song and
+// Input: results as JSON (write/json.h), in the command's own process. Output: one row per song and
 // parameters, in batches of one transaction each: a kill at any moment loses at most the open batch
-// and leaves no row half written. Called by analyse_inputs.cpp. Several commands may share one
-// store. Without --store every function does nothing.
+// and leaves no row half-written. Used by run/analyse_inputs.h.
 #ifndef TAVO_CLI_STORE_STORE_H
 #define TAVO_CLI_STORE_STORE_H
 
@@ -23,9 +23,6 @@ struct file_state {
     int64_t mtime_ns = 0;  // last change, since 1970
 };
 
-// Returns 0 or errno.
-int read_file_state(const std::string &path, file_state &state);
-
 struct stored_song {
     std::string path;    // any bytes
     file_state file;     // before the analysis
@@ -37,7 +34,7 @@ struct store {
     options opts;
     const database_kind *kind = nullptr;  // null without --store
     std::string location;
-    void *handle = nullptr;          // null while disconnected
+    connection run;                  // null while disconnected
     int version = 0;                 // of the table
     bool has_failed = false;         // the store is no longer used, and the run ends
     std::vector<stored_song> batch;  // not committed yet
@@ -49,31 +46,31 @@ struct store {
     int64_t known_failed = 0;      // of these, songs stored as failed
 };
 
-// These functions retry while the database does not answer, with growing pauses, for --patience.
-// Each pause is reported on standard error and ends at a stop. After a failure the store is given
-// up.
-
 // Connects and, unless the store is only read, creates or upgrades the table. Does not retry.
 failure open_store(store &db, const options &opts);
 
+// The following functions retry while the database does not answer, with growing pauses, for
+// --patience. Each pause is reported on standard error and ends at a stop. After a failure the
+// store is no longer used.
+
 // Sets is_new if the song must be analysed: its current file is not stored for these parameters, or
-// the options ask for it again.
+// the options request another analysis. file receives the state of the file.
 failure find_song(store &db, const std::string &path, file_state &file, bool &is_new);
 
-// Adds a result to the batch and commits the batch if it is full or old. If the store has been
-// given up, results stay in the batch for close_store.
+// Adds a result to the batch and commits the batch if it is full or old. After a failure of the
+// store, results stay in the batch until close_store.
 failure add_song(store &db, stored_song &&song);
 
 // Commits a batch that is old.
 failure commit_old_batch(store &db);
-int batch_timeout_ms(const store &db);  // timeout for poll; -1 if none
+int batch_timeout_ms(const store &db);  // time until the batch is old, for poll; -1 if it is empty
 
-// With --from-store: the next row of these parameters, in the order of the paths. found is false
-// after the last one.
+// With --from-store: reads the next row of these parameters, in the order of the paths. found is
+// false after the last one.
 failure read_next(store &db, stored_song &song, bool &found);
 
-// Commits what is left and closes. Results that could not be stored go to standard output as JSON.
-// summary: a line for the user.
+// Commits the last batch. Results that could not be stored are written to standard output as JSON.
+// summary receives one line for the user.
 failure close_store(store &db, std::string &summary);
 
 #endif
