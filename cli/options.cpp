@@ -14,7 +14,6 @@
 #include "cli/input/shard.h"
 #include "cli/write/file_names.h"
 #include "cli/write/format.h"
-#include "cli/write/frame_rate.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"
 

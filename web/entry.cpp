@@ -65,6 +65,7 @@ extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, i
                              int32_t channels) {
     fnamedec = "";
     record result = failed_record(path, mode, "");
+    result.sound_path = path;
     result.length_s = length_s;
     analyse_song(result, max_beats);
     result.channels = channels;

@@ -5,24 +5,22 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdint>
 #include <filesystem>
-#include <fstream>
 
+#include "cli/input/file_bytes.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
 
 namespace {
 
-// The library ignores write errors, so a full disk only shows in the length.
+// The library ignores write errors, so only the length shows that the disk was full.
 bool is_whole_track(const std::string &path) {
-    std::ifstream file(path, std::ios::binary);
-    file.seekg(40);  // the last field of the WAV header: the size of the data, little-endian
-    uint32_t size = 0;
-    for (int i = 0; i < 4; ++i) size |= static_cast<uint32_t>(file.get()) << (8 * i);
+    int code = 0;
+    const std::string size = read_bytes(path, 40, 4, code);  // of the samples, little-endian
     std::error_code failed;
-    return file && std::filesystem::file_size(path, failed) == uintmax_t{44} + size;
+    return std::filesystem::file_size(path, failed) ==
+           44 + big_endian(std::string(size.rbegin(), size.rend()), 0, 4);
 }
 
 }  // namespace
@@ -33,7 +31,6 @@ failure begin_click(output_file &track, const options &opts, const std::string &
     if (same_file(opts.click, input)) {
         return {"The click track would replace the file that is analysed."};
     }
-    track.target = opts.click;
     struct stat info {};
     if (stat(opts.click.c_str(), &info) == 0 && !S_ISREG(info.st_mode)) {
         const int fd = open(opts.click.c_str(), O_WRONLY | O_CLOEXEC | O_NONBLOCK);

@@ -12,6 +12,8 @@
 
 namespace {
 
+namespace fs = std::filesystem;
+
 constexpr const char *kBitRate = "192k";  // of lossy encodings
 
 // Chooses a clip's format from that of its input. A clip in ADTS, MPEG Layer II, AC-3, Windows
@@ -29,7 +31,7 @@ constexpr audio_ending kAudioEndings[] = {
     {".aiff", ".aiff"}, {".aifc", ".aiff"}, {".caf", ".caf"},   {".wv", ".wv"}};
 
 std::string ending_of(const std::string &path) {
-    return std::filesystem::path(path).extension();
+    return fs::path(path).extension();
 }
 
 std::string clip_ending(const std::string &input) {
@@ -54,19 +56,12 @@ std::string cut_filter(const record &result, const options &opts) {
     return filter;
 }
 
-// Makes ffmpeg report its progress on standard output, so that run_ffmpeg sees that it works.
-std::vector<std::string> clip_output(const std::string &filter, const std::string &path) {
-    return {"-map",   "0:a:0",     "-af",    filter, "-map_chapters", "-1", "-b:a",
-            kBitRate, "-progress", "pipe:1", "-y",   "file:" + path};
-}
-
 }  // namespace
 
 std::string clip_path(const std::string &input, const options &opts) {
     std::error_code failed;
-    if (!std::filesystem::is_directory(opts.clip, failed)) return opts.clip;
-    const std::string folder = opts.clip + (opts.clip.back() == '/' ? "" : "/");
-    return folder + fitting_name(base_name(input), ".clip" + clip_ending(input));
+    if (!fs::is_directory(opts.clip, failed)) return opts.clip;
+    return fs::path(opts.clip) / fitting_name(base_name(input), ".clip" + clip_ending(input));
 }
 
 failure write_clip(const record &result, const options &opts, const std::string &target,
@@ -76,7 +71,11 @@ failure write_clip(const record &result, const options &opts, const std::string 
     }
     output_file file;
     if (failure failed = begin_output(file, target, ending_of(target))) return failed;
-    const std::vector<std::string> words = clip_output(cut_filter(result, opts), file.temporary);
+    // With its progress on standard output run_ffmpeg sees that ffmpeg works.
+    const std::vector<std::string> words = {
+        "-map",          "0:a:0",  "-af",  cut_filter(result, opts),
+        "-map_chapters", "-1",     "-b:a", kBitRate,
+        "-progress",     "pipe:1", "-y",   "file:" + file.temporary};
     failure failed = run_ffmpeg({opts.ffmpeg, result.file, song.source_fd, words}, stop_fd,
                                 [](std::string_view) { return failure(); });
     if (!failed) return commit_output(file, opts.force);

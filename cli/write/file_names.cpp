@@ -6,9 +6,9 @@
 #include <cstdint>
 #include <cstring>
 #include <filesystem>
-#include <functional>
 #include <iterator>
 #include <string_view>
+#include <vector>
 
 #include "cli/write/value_text.h"
 
@@ -43,13 +43,12 @@ character first_character(std::string_view text) {
     return is_valid ? character{bytes, point, true} : character{text.substr(0, 1)};
 }
 
-void for_each_character(std::string_view text,
-                        const std::function<void(const character &)> &visit) {
-    while (!text.empty()) {
-        const character first = first_character(text);
-        visit(first);
-        text.remove_prefix(first.bytes.size());
+std::vector<character> characters_of(std::string_view text) {
+    std::vector<character> characters;
+    for (; !text.empty(); text.remove_prefix(characters.back().bytes.size())) {
+        characters.push_back(first_character(text));
     }
+    return characters;
 }
 
 // True for a character that moves the cursor or reorders text on a terminal: control characters,
@@ -74,78 +73,59 @@ uint32_t hash_of(const std::string &bytes) {
 
 }  // namespace
 
-bool is_utf8(const std::string &bytes) {
-    bool is_valid = true;
-    for_each_character(bytes, [&](const character &each) { is_valid &= each.is_valid; });
-    return is_valid;
-}
-
 std::string shown(const std::string &bytes) {
+    const std::map<std::string_view, const char *> escapes = {
+        {"\n", "\\n"}, {"\t", "\\t"}, {"\\", "\\\\"}};
     std::string out;
-    for_each_character(bytes, [&](const character &each) {
-        if (each.bytes == "\n") {
-            out += "\\n";
-        } else if (each.bytes == "\t") {
-            out += "\\t";
-        } else if (each.bytes == "\\") {
-            out += "\\\\";
+    for (const character &each : characters_of(bytes)) {
+        const auto escape = escapes.find(each.bytes);
+        if (escape != escapes.end()) {
+            out += escape->second;
         } else if (each.is_valid && !is_control(each.point)) {
             out += each.bytes;
         } else {
             for (const char byte : each.bytes) out += formatted("\\x%02X", byte & 0xFF);
         }
-    });
+    }
     return out;
 }
 
 std::string json_text(const std::string &utf8) {
     std::string out;
-    for_each_character(utf8, [&](const character &each) {
-        if (is_control(each.point)) {
-            out += formatted("\\u%04X", each.point);
-        } else {
-            out += each.bytes;
-        }
-    });
+    for (const character &each : characters_of(utf8)) {
+        out += is_control(each.point) ? formatted("\\u%04X", each.point) : std::string(each.bytes);
+    }
     return out;
 }
 
 std::string as_utf8(const std::string &bytes) {
     std::string out;
-    for_each_character(
-        bytes, [&](const character &each) { out += each.is_valid ? each.bytes : kReplacement; });
-    return out;
-}
-
-std::string html_text(const std::string &bytes) {
-    std::string out;
-    for (const char c : as_utf8(bytes)) {
-        switch (c) {
-            case '&':
-                out += "&amp;";
-                break;
-            case '<':
-                out += "&lt;";
-                break;
-            case '>':
-                out += "&gt;";
-                break;
-            case '"':
-                out += "&quot;";
-                break;
-            default:
-                out += c;
-        }
+    for (const character &each : characters_of(bytes)) {
+        out += each.is_valid ? each.bytes : kReplacement;
     }
     return out;
 }
 
+std::string replaced(const std::string &text, const std::map<char, const char *> &replacements) {
+    std::string out;
+    for (const char c : text) {
+        const auto found = replacements.find(c);
+        out += found == replacements.end() ? std::string(1, c) : found->second;
+    }
+    return out;
+}
+
+std::string html_text(const std::string &bytes) {
+    return replaced(as_utf8(bytes),
+                    {{'&', "&amp;"}, {'<', "&lt;"}, {'>', "&gt;"}, {'"', "&quot;"}});
+}
+
 std::string xml_text(const std::string &bytes) {
     std::string allowed;
-    for_each_character(bytes, [&](const character &each) {
+    for (const character &each : characters_of(bytes)) {
         const bool is_allowed = each.point >= 0x20 && each.point != 0xFFFE && each.point != 0xFFFF;
         allowed += is_allowed ? each.bytes : kReplacement;
-    });
+    }
     return html_text(allowed);
 }
 

@@ -2,9 +2,8 @@
 #ifndef TAVO_CLI_WRITE_FILE_NAMES_H
 #define TAVO_CLI_WRITE_FILE_NAMES_H
 
+#include <map>
 #include <string>
-
-bool is_utf8(const std::string &bytes);
 
 // Returns one line of text. Control characters, line separators and marks of the writing direction
 // become \n, \t or \xNN; a backslash is doubled; bytes that are not UTF-8 become \xNN.
@@ -16,6 +15,9 @@ std::string json_text(const std::string &utf8);
 
 // Returns valid UTF-8: each byte that is not part of a character becomes U+FFFD.
 std::string as_utf8(const std::string &bytes);
+
+// Returns the text with some characters replaced.
+std::string replaced(const std::string &text, const std::map<char, const char *> &replacements);
 
 // The same, with & < > and " as entities. In XML, characters that XML forbids also become U+FFFD.
 std::string html_text(const std::string &bytes);

@@ -1,7 +1,17 @@
 #include "cli/write/format.h"
 
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <cmath>
+#include <utility>
+#include <vector>
+
 #include "cli/write/file_names.h"
 #include "cli/write/json.h"
+#include "cli/write/markers.h"
 #include "cli/write/value_text.h"
 
 namespace {
@@ -9,9 +19,28 @@ namespace {
 // Mean square of -10 dBFS, full scale 1: the library refines louder passages.
 constexpr double kRefinedPower = 0.1;
 
+// Keys of json_object, in the order of the columns of CSV.
+constexpr const char *kColumns[] = {"file",      "mode",        "status",    "sample_rate",
+                                    "channels",  "duration_ms", "offset_ms", "hl_pos_ms",
+                                    "hl_end_ms", "hl_refined",  "bpm",       "beat_count",
+                                    "beats_ms",  "cpu_ms",      "error"};
+
+// ---- Text for people.
+
+std::string highlight_lines(const record &result) {
+    const bool is_coarse = has_refinement(result) && !is_refined(result);
+    const auto clock = is_coarse ? whole_clock_text : clock_text;
+    std::string line = "  highlight  ";
+    line += (is_coarse ? "about " : "") + clock(result.hl_pos_ms);
+    if (result.length_s > 0) line += " to " + clock(highlight_end_ms(result, result.length_s));
+    const bool is_quiet = result.loudest > 0.0 && result.loudest < kRefinedPower;
+    return line + (is_coarse && is_quiet && !result.raised ? " (--normalize refines)\n" : "\n");
+}
+
 std::string beats_lines(const record &result) {
-    std::string lines = "  tempo      " + tempo_text(result) + "\n";
-    lines += "  beats      " + std::to_string(result.beats_ms.size());
+    std::string lines = "  tempo      " + std::to_string(result.bpm) + " BPM";
+    if (result.mode == TAVO_MODE_BOTH) lines += " from the highlight on";
+    lines += "\n  beats      " + std::to_string(result.beats_ms.size());
     if (!result.beats_ms.empty()) {
         lines += ", from " + clock_text(static_cast<double>(result.beats_ms.front())) + " to " +
                  clock_text(static_cast<double>(result.beats_ms.back()));
@@ -25,20 +54,86 @@ std::string text_record(const record &result) {
                        clock_text(static_cast<double>(result.duration_ms)) + ", " +
                        std::to_string(result.sample_rate) + " Hz, " +
                        count_text(static_cast<size_t>(result.channels), "channel") + "\n";
-    if (result.has_highlight) {
-        const bool is_quiet = result.loudest > 0.0 && result.loudest < kRefinedPower;
-        const bool is_coarse = has_refinement(result) && !is_refined(result) && !result.raised;
-        text += "  highlight  " + highlight_text(result);
-        text += is_coarse && is_quiet ? " (--normalize refines)\n" : "\n";
-    }
+    if (result.has_highlight) text += highlight_lines(result);
     if (result.has_beats) text += beats_lines(result);
     return text;
+}
+
+// ---- CSV.
+
+// Names are written byte for byte, whatever their encoding, except to a terminal.
+std::string name_text(const std::string &name) {
+    return isatty(STDOUT_FILENO) == 1 ? shown(name) : name;
+}
+
+// Quotes the text if necessary. The format is for programs, so a text that begins with = + - @ is
+// not changed.
+std::string quoted(const std::string &text) {
+    const std::string value = name_text(text);
+    if (value.find_first_of(",\"\r\n") == std::string::npos) return value;
+    return "\"" + replaced(value, {{'"', "\"\""}}) + "\"";
+}
+
+std::string cell(const result_json &value) {
+    if (value.is_string()) return quoted(value.get<std::string>());
+    if (value.is_number_float()) {  // the shortest decimal that converts back to the same float
+        std::array<char, 64> text{};
+        const auto end = std::to_chars(text.data(), text.data() + text.size(), value.get<float>(),
+                                       std::chars_format::fixed);
+        return std::string(text.data(), end.ptr);
+    }
+    if (!value.is_array()) return value.dump();
+    std::string numbers;
+    for (const result_json &item : value) numbers += (numbers.empty() ? "" : " ") + cell(item);
+    return numbers;
+}
+
+std::string csv_record(const record &result) {
+    result_json object = json_object(result);
+    object["file"] = result.file;  // exact bytes
+    std::string row;
+    for (const char *name : kColumns) {
+        if (name != kColumns[0]) row += ",";
+        if (object.contains(name)) row += cell(object[name]);
+    }
+    return row + "\n";
+}
+
+// ---- A template of the user: --print.
+
+std::string seconds(double ms) {
+    return formatted("%.3f", ms / 1000.0);
+}
+
+// Returns the fields and a song's values, which are empty where the song has none.
+std::vector<std::pair<std::string, std::string>> fields_of(const record &result) {
+    const double start = player_ms(result, result.hl_pos_ms);
+    const double end = player_ms(result, region_end_ms(result));
+    const bool has_highlight = result.has_highlight;
+    std::string beats;
+    for (const float beat : result.beats_ms) {
+        beats += (beats.empty() ? "" : " ") + seconds(player_ms(result, static_cast<double>(beat)));
+    }
+    return {{"file", name_text(result.file)},
+            {"stem", name_text(stem(base_name(result.file)))},
+            {"hl_s", has_highlight ? seconds(start) : ""},
+            {"hl_ms", has_highlight ? std::to_string(std::llround(start)) : ""},
+            {"end_s", has_highlight ? seconds(end) : ""},
+            {"bpm", result.has_beats ? std::to_string(result.bpm) : ""},
+            {"beats", beats}};
+}
+
+char escaped_character(char letter) {
+    return letter == 'n' ? '\n' : letter == 't' ? '\t' : letter;
 }
 
 }  // namespace
 
 std::string format_head(result_format format) {
-    return format == result_format::csv ? csv_head() : "";
+    if (format != result_format::csv) return "";
+    std::string row;
+    for (const char *name : kColumns) row += (row.empty() ? "" : ",") + std::string(name);
+    return row + "\n";
 }
 
 std::string format_record(const options &opts, const record &result) {
@@ -59,4 +154,28 @@ std::string format_record(const options &opts, const record &result) {
         default:
             return "";
     }
+}
+
+failure fill_template(const std::string &text, const record &result, std::string &filled) {
+    const auto fields = fields_of(result);
+    for (size_t i = 0; i < text.size(); ++i) {
+        if (text[i] == '\\' && i + 1 < text.size()) {
+            filled += escaped_character(text[++i]);
+        } else if (text[i] == '{') {
+            const size_t end = std::min(text.find('}', i), text.size());
+            const std::string name = text.substr(i + 1, end - i - 1);
+            const auto field = std::find_if(fields.begin(), fields.end(),
+                                            [&](const auto &entry) { return entry.first == name; });
+            if (end == text.size() || field == fields.end()) {
+                return {"--print: {" + name +
+                        "} is not a field; {file}, {stem}, {hl_s}, {hl_ms}, {end_s}, {bpm} and "
+                        "{beats} are. \\{ is a brace."};
+            }
+            filled += field->second;
+            i = end;
+        } else {
+            filled += text[i];
+        }
+    }
+    return {};
 }

@@ -1,4 +1,7 @@
 // A record as text for standard output, in one of the formats.
+//
+// Input: a record (run/record.h). Output: text, which run/ordered_output.h writes. Follows
+// run/analyse.h.
 #ifndef TAVO_CLI_WRITE_FORMAT_H
 #define TAVO_CLI_WRITE_FORMAT_H
 
@@ -14,11 +17,8 @@ std::string format_head(result_format format);
 // Returns the text of one record; empty if the format does not print it.
 std::string format_record(const options &opts, const record &result);
 
-// Appends the text with each {field} replaced, and with \n, \t and other escaped characters. Fails
-// for an unknown field.
+// Fills a template of --print: appends its text with each {field} replaced, and with \n, \t and
+// other escaped characters. Fails for an unknown field.
 failure fill_template(const std::string &text, const record &result, std::string &filled);
-
-std::string csv_head();
-std::string csv_record(const record &result);
 
 #endif

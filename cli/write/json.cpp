@@ -8,7 +8,7 @@
 result_json json_object(const record &result) {
     result_json object;
     object["file"] = as_utf8(result.file);
-    if (!is_utf8(result.file)) object["file_bytes"] = percent_encoded(result.file);
+    if (object["file"] != result.file) object["file_bytes"] = percent_encoded(result.file);
     object["mode"] = mode_word(result.mode);
     object["status"] = status_word(result.status);
     if (result.has_stream) {

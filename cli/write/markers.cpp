@@ -1,10 +1,277 @@
 #include "cli/write/markers.h"
 
+#include <algorithm>
+#include <cmath>
+#include <filesystem>
+#include <iterator>
+#include <nlohmann/json.hpp>
+
 #include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
+
+// A rate of video frames and its timecode.
+struct frame_rate {
+    const char *name;  // as in --fps
+    int32_t frames;    // during these seconds:
+    int32_t seconds;
+    int32_t base;  // frame numbers per second of timecode
+    bool drop;     // the timecode skips frame numbers to match the clock
+};
 
 namespace {
 
-constexpr int32_t kUsualLengthSeconds = 30;  // of a usual preview, if --length is not given
+using json = nlohmann::ordered_json;
+
+constexpr int32_t kUsualLengthSeconds = 30;  // of a preview, if --length is not given
+
+constexpr frame_rate kRates[] = {
+    {"23.976", 24000, 1001, 24, false}, {"24", 24, 1, 24, false},
+    {"25", 25, 1, 25, false},           {"29.97", 30000, 1001, 30, false},
+    {"29.97df", 30000, 1001, 30, true}, {"30", 30, 1, 30, false},
+    {"50", 50, 1, 50, false},           {"59.94", 60000, 1001, 60, false},
+    {"59.94df", 60000, 1001, 60, true}, {"60", 60, 1, 60, false},
+};
+constexpr int64_t kStartMinutes = 60;  // the timecode of frame 0, as in editors
+
+// The highlight from its start to its end, or a beat, whose times are equal. Milliseconds in the
+// player's time.
+struct mark {
+    double start_ms;
+    double end_ms;
+    std::string name;
+};
+
+bool is_region(const mark &entry) {
+    return entry.end_ms > entry.start_ms;
+}
+
+// Returns all marks of a song, the highlight first.
+std::vector<mark> marks_of(const record &result) {
+    std::vector<mark> marks;
+    if (result.has_highlight) {
+        marks.push_back({player_ms(result, result.hl_pos_ms),
+                         player_ms(result, region_end_ms(result)), "highlight"});
+    }
+    for (size_t i = 0; i < result.beats_ms.size(); ++i) {
+        const double at = player_ms(result, static_cast<double>(result.beats_ms[i]));
+        marks.push_back({at, at, "beat " + std::to_string(i + 1)});
+    }
+    return marks;
+}
+
+double song_end_ms(const record &result) {
+    return player_ms(result, static_cast<double>(result.duration_ms));
+}
+
+// Returns the nearest video frame.
+int64_t frame_at(double ms, const frame_rate &rate) {
+    return std::llround(ms / 1000.0 * rate.frames / rate.seconds);
+}
+
+// Returns the length of a mark in video frames, at least 1.
+int64_t frame_count(const mark &entry, const frame_rate &rate) {
+    return std::max<int64_t>(1, frame_at(entry.end_ms, rate) - frame_at(entry.start_ms, rate));
+}
+
+// Formats a timecode hh:mm:ss:ff, with a semicolon before the frames for drop-frame timecode. That
+// skips the first frame numbers of each minute, except of every tenth.
+std::string timecode(int64_t frame, const frame_rate &rate) {
+    const int64_t dropped = rate.drop ? rate.base / 15 : 0;  // frame numbers
+    const int64_t minute = 60LL * rate.base - dropped;       // frames per minute
+    const int64_t ten_minutes = 10 * minute + dropped;
+    frame += kStartMinutes / 10 * ten_minutes;
+    const int64_t rest = frame % ten_minutes;
+    const int64_t minutes = rest < dropped ? 0 : (rest - dropped) / minute;
+    const int64_t number = frame + dropped * (9 * (frame / ten_minutes) + minutes);
+    const long long seconds = number / rate.base;
+    const long long frames = number % rate.base;
+    return formatted("%02lld:%02lld:%02lld%c%02lld", seconds / 3600, seconds / 60 % 60,
+                     seconds % 60, rate.drop ? ';' : ':', frames);
+}
+
+// ---- Text with one or a few lines per mark.
+
+// Formats a time as hh:mm:ss.mmm.
+std::string clock(double ms) {
+    const long long whole = std::llround(ms);
+    return formatted("%02lld:%02lld:%02lld.%03lld", whole / 3'600'000, whole / 60'000 % 60,
+                     whole / 1000 % 60, whole % 1000);
+}
+
+// A label track: start, end and name, separated by tabs. Equal times make a point.
+std::string audacity_labels(const record &result, const frame_rate & /*rate*/) {
+    std::string out;
+    for (const mark &entry : marks_of(result)) {
+        out += formatted("%.6f\t%.6f\t", entry.start_ms / 1000.0, entry.end_ms / 1000.0) +
+               entry.name + "\n";
+    }
+    return out;
+}
+
+// Each line has a time, a space and the comment of the guide. A guide is a point.
+std::string kdenlive_guides(const record &result, const frame_rate & /*rate*/) {
+    std::string out;
+    for (const mark &entry : marks_of(result)) {
+        out += clock(entry.start_ms) + " " + entry.name + "\n";
+    }
+    return out;
+}
+
+// The table of Reaper's region and marker manager.
+std::string reaper_markers(const record &result, const frame_rate & /*rate*/) {
+    std::string out = "#,Name,Start,End,Length\n";
+    size_t regions = 0;
+    size_t points = 0;
+    for (const mark &entry : marks_of(result)) {
+        const bool region = is_region(entry);
+        out += (region ? "R" + std::to_string(++regions) : "M" + std::to_string(++points)) + "," +
+               entry.name + "," + clock(entry.start_ms) + ",";
+        if (region) out += clock(entry.end_ms) + "," + clock(entry.end_ms - entry.start_ms) + "\n";
+        if (!region) out += ",\n";
+    }
+    return out;
+}
+
+// FFmpeg's metadata file. The chapters are contiguous and begin at the start of the song.
+std::string ffmetadata_chapters(const record &result, const frame_rate & /*rate*/) {
+    std::vector<mark> chapters;
+    for (const mark &entry : marks_of(result)) {
+        chapters.push_back(entry);
+        if (!result.has_beats) chapters.push_back({entry.end_ms, entry.end_ms, "after"});
+    }
+    if (chapters.empty() || std::llround(chapters[0].start_ms) > 0) {
+        chapters.insert(chapters.begin(), {0.0, 0.0, "start"});
+    }
+    std::string out = ";FFMETADATA1\n";
+    for (size_t i = 0; i < chapters.size(); ++i) {
+        const bool is_last = i + 1 == chapters.size();
+        const long long start = std::llround(chapters[i].start_ms);
+        const long long end =
+            std::llround(is_last ? song_end_ms(result) : chapters[i + 1].start_ms);
+        if (end <= start) continue;
+        out += "[CHAPTER]\nTIMEBASE=1/1000\nSTART=" + std::to_string(start) +
+               "\nEND=" + std::to_string(end) + "\ntitle=" + chapters[i].name + "\n";
+    }
+    return out;
+}
+
+// An edit list with markers as comments, as DaVinci Resolve exports and imports them.
+std::string edl_markers(const record &result, const frame_rate &rate) {
+    std::string out = "TITLE: " + shown(base_name(result.file)) +
+                      "\nFCM: " + (rate.drop ? "DROP FRAME" : "NON-DROP FRAME") + "\n";
+    size_t event = 0;
+    for (const mark &entry : marks_of(result)) {
+        const int64_t start = frame_at(entry.start_ms, rate);
+        const std::string times = timecode(start, rate) + " " + timecode(start + 1, rate);
+        out += formatted("\n%03zu  001      V     C        ", ++event) + times + " " + times +
+               "\n |C:ResolveColor" + (is_region(entry) ? "Red" : "Blue") + " |M:" + entry.name +
+               " |D:" + std::to_string(frame_count(entry, rate)) + "\n";
+    }
+    return out;
+}
+
+// ---- Final Cut Pro's XML, version 1.8: a project with the song as its only clip, and markers on
+// it.
+
+// Returns an attribute of an element. The value is already escaped.
+std::string attribute(const char *name, const std::string &value) {
+    return std::string(" ") + name + "=\"" + value + "\"";
+}
+
+// Formats a number of video frames as a fraction of seconds.
+std::string frames_text(int64_t frames, const frame_rate &rate) {
+    return std::to_string(frames * rate.seconds) + "/" + std::to_string(rate.frames) + "s";
+}
+
+std::string fcpxml_markers(const record &result, const frame_rate &rate) {
+    const std::string name = attribute("name", xml_text(base_name(result.file)));
+    const int64_t frames = frame_at(static_cast<double>(result.duration_ms), rate);
+    const std::string length =
+        attribute("duration", frames_text(std::max<int64_t>(1, frames), rate));
+    std::string out =
+        "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<!DOCTYPE fcpxml>\n<fcpxml version=\"1.8\">\n"
+        "<resources>\n";
+    out += "<format id=\"r1\"" + attribute("frameDuration", frames_text(1, rate)) +
+           " width=\"1920\" height=\"1080\"/>\n";
+    out += "<asset id=\"r2\"" + name + attribute("src", file_url(result.file)) + " start=\"0s\"" +
+           length + " hasAudio=\"1\" audioSources=\"1\"" +
+           attribute("audioChannels", std::to_string(result.channels)) +
+           attribute("audioRate", std::to_string(result.sample_rate)) + "/>\n";
+    out += "</resources>\n<project" + name + ">\n<sequence format=\"r1\"" + length +
+           " tcStart=\"0s\"" + attribute("tcFormat", rate.drop ? "DF" : "NDF") + ">\n<spine>\n";
+    out += "<asset-clip ref=\"r2\"" + name + " offset=\"0s\"" + length + ">\n";
+    for (const mark &entry : marks_of(result)) {
+        const int64_t start = frame_at(entry.start_ms, rate);
+        out += "<marker" + attribute("start", frames_text(start, rate)) +
+               attribute("duration", frames_text(frame_count(entry, rate), rate)) +
+               attribute("value", entry.name) + "/>\n";
+    }
+    return out + "</asset-clip>\n</spine>\n</sequence>\n</project>\n</fcpxml>\n";
+}
+
+// ---- Formats based on JSON.
+
+// Segments for LosslessCut: the highlight, then one from each beat to the next or to the end of the
+// song.
+std::string losslesscut_project(const record &result, const frame_rate & /*rate*/) {
+    const std::vector<mark> marks = marks_of(result);
+    json segments = json::array();
+    for (size_t i = 0; i < marks.size(); ++i) {
+        double end_ms = marks[i].end_ms;
+        if (!is_region(marks[i])) {
+            end_ms = i + 1 < marks.size() ? marks[i + 1].start_ms : song_end_ms(result);
+        }
+        if (end_ms <= marks[i].start_ms) continue;  // two beats at the same time
+        segments.push_back({{"start", std::round(marks[i].start_ms) / 1000.0},
+                            {"end", std::round(end_ms) / 1000.0},
+                            {"name", marks[i].name}});
+    }
+    const json project = {{"version", 1},
+                          {"mediaFileName", as_utf8(base_name(result.file))},
+                          {"cutSegments", segments}};
+    return project.dump(2) + "\n";
+}
+
+// A span of video frames in OpenTimelineIO.
+json range(int64_t start, int64_t length, const frame_rate &rate) {
+    const auto time = [&](int64_t count) {
+        return json{{"OTIO_SCHEMA", "RationalTime.1"},
+                    {"value", count},
+                    {"rate", static_cast<double>(rate.frames) / rate.seconds}};
+    };
+    return {
+        {"OTIO_SCHEMA", "TimeRange.1"}, {"start_time", time(start)}, {"duration", time(length)}};
+}
+
+// OpenTimelineIO: a timeline with the song as its only clip and the markers on it.
+std::string otio_timeline(const record &result, const frame_rate &rate) {
+    json markers = json::array();
+    for (const mark &entry : marks_of(result)) {
+        const int64_t start = frame_at(entry.start_ms, rate);
+        markers.push_back(
+            {{"OTIO_SCHEMA", "Marker.2"},
+             {"name", entry.name},
+             {"color", is_region(entry) ? "RED" : "BLUE"},
+             {"marked_range", range(start, frame_at(entry.end_ms, rate) - start, rate)}});
+    }
+    const std::string name = as_utf8(base_name(result.file));
+    const int64_t length = std::max<int64_t>(1, frame_at(song_end_ms(result), rate));
+    const json whole = range(0, length, rate);
+    const json clip = {{"OTIO_SCHEMA", "Clip.1"},
+                       {"name", name},
+                       {"source_range", whole},
+                       {"media_reference",
+                        {{"OTIO_SCHEMA", "ExternalReference.1"},
+                         {"target_url", file_url(result.file)},
+                         {"available_range", whole}}},
+                       {"markers", markers}};
+    const json track = {{"OTIO_SCHEMA", "Track.1"},
+                        {"name", "song"},
+                        {"kind", "Audio"},
+                        {"children", json::array({clip})}};
+    const json stack = {{"OTIO_SCHEMA", "Stack.1"}, {"children", json::array({track})}};
+    return json({{"OTIO_SCHEMA", "Timeline.1"}, {"name", name}, {"tracks", stack}}).dump(2) + "\n";
+}
 
 }  // namespace
 
@@ -29,32 +296,26 @@ const marker_format *find_marker_format(const std::string &word) {
     return nullptr;
 }
 
+std::vector<std::string> frame_rate_names() {
+    std::vector<std::string> names;
+    for (const frame_rate &rate : kRates) names.emplace_back(rate.name);
+    return names;
+}
+
 std::string marker_path(const std::string &input, const options &opts) {
     const std::string name = base_name(input);
-    const std::string folder = opts.output_dir.empty()
-                                   ? input.substr(0, input.size() - name.size())
-                                   : opts.output_dir + (opts.output_dir.back() == '/' ? "" : "/");
-    return folder +
-           fitting_name(opts.markers->drops_ending ? stem(name) : name, opts.markers->suffix);
+    const std::string file =
+        fitting_name(opts.markers->drops_ending ? stem(name) : name, opts.markers->suffix);
+    if (!opts.output_dir.empty()) return std::filesystem::path(opts.output_dir) / file;
+    return std::filesystem::path(input).replace_filename(file);
 }
 
 std::string marker_content(const record &result, const options &opts) {
-    return opts.markers->content(result, *find_frame_rate(opts.fps));
+    const auto *rate = std::find_if(std::begin(kRates), std::end(kRates),
+                                    [&](const frame_rate &each) { return opts.fps == each.name; });
+    return opts.markers->content(result, *rate);
 }
 
 double region_end_ms(const record &result) {
     return highlight_end_ms(result, result.length_s > 0 ? result.length_s : kUsualLengthSeconds);
-}
-
-std::vector<mark> marks_of(const record &result) {
-    std::vector<mark> marks;
-    if (result.has_highlight) {
-        marks.push_back({player_ms(result, result.hl_pos_ms),
-                         player_ms(result, region_end_ms(result)), "highlight"});
-    }
-    for (size_t i = 0; i < result.beats_ms.size(); ++i) {
-        const double at = player_ms(result, static_cast<double>(result.beats_ms[i]));
-        marks.push_back({at, at, "beat " + std::to_string(i + 1)});
-    }
-    return marks;
 }

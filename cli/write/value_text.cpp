@@ -55,19 +55,6 @@ std::string clock_text(double ms) {
     return seconds_text(tenths / 10) + "." + std::to_string(tenths % 10);
 }
 
-std::string highlight_text(const record &result) {
-    const bool about = has_refinement(result) && !is_refined(result);
-    const auto clock = about ? whole_clock_text : clock_text;
-    std::string text = (about ? "about " : "") + clock(result.hl_pos_ms);
-    if (result.length_s > 0) text += " to " + clock(highlight_end_ms(result, result.length_s));
-    return text;
-}
-
-std::string tempo_text(const record &result) {
-    return std::to_string(result.bpm) + " BPM" +
-           (result.mode == TAVO_MODE_BOTH ? " from the highlight on" : "");
-}
-
 std::string count_text(size_t count, const char *noun) {
     return std::to_string(count) + " " + noun + (count == 1 ? "" : "s");
 }

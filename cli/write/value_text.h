@@ -20,12 +20,6 @@ const char *status_word(outcome status);
 std::string clock_text(double ms);
 std::string whole_clock_text(double ms);
 
-// "0:30.2 to 1:00.2"; "about 0:36" if the start is not refined.
-std::string highlight_text(const record &result);
-
-// "117 BPM"; in mode both "117 BPM from the highlight on".
-std::string tempo_text(const record &result);
-
 // "1 file", "2 files".
 std::string count_text(size_t count, const char *noun);
 
