@@ -3,31 +3,25 @@
 #include <sys/stat.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cinttypes>
 #include <cmath>
+#include <cstdint>
 #include <filesystem>
-#include <fstream>
-#include <iterator>
 
+#include "cli/input/file_bytes.h"
 #include "cli/input/recognise.h"
-#include "cli/report/report_pages.h"
 #include "cli/report/song_view.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
+// Parts of the pages, from report_pages.cpp, which the build generates from the sources in this
+// folder. The song's title and its data, and the rows of the index, belong between them.
+extern const char *const kSongPage[3];
+extern const char *const kIndexPage[2];
+
 namespace {
 
 namespace fs = std::filesystem;
-
-constexpr int kMiniatureWidth = 140;
-constexpr int kMiniatureHeight = 28;
-
-// Returns the template with the first key replaced.
-std::string filled(std::string page, const std::string &key, const std::string &value) {
-    const size_t at = page.find(key);
-    return at == std::string::npos ? page : page.replace(at, key.size(), value);
-}
 
 std::string base64(const std::string &bytes) {
     constexpr const char *kDigits =
@@ -46,24 +40,13 @@ std::string base64(const std::string &bytes) {
     return out;
 }
 
-// Returns JSON that is safe inside a script element.
-std::string script_json(const result_json &value) {
-    std::string text = value.dump();
-    for (size_t at = text.find('<'); at != std::string::npos; at = text.find('<', at)) {
-        text.replace(at, 1, "\\u003c");
-    }
-    return text;
-}
-
 // Adds the sound to the page at page_path: the bytes of the file, or its relative URL.
 failure add_sound(const std::string &song_path, const std::string &page_path, bool embed,
                   result_json &view) {
     if (embed) {
-        std::ifstream file(song_path, std::ios::binary);
-        const std::string bytes((std::istreambuf_iterator<char>(file)),
-                                std::istreambuf_iterator<char>());
-        if (!file) return {"The song could not be read for its page."};
-        view["embedded"] = base64(bytes);
+        int code = 0;
+        view["embedded"] = base64(read_bytes(song_path, 0, INT64_MAX, code));
+        if (code != 0) return {"The song could not be read for its page."};
         return {};
     }
     file_kind kind = file_kind::unknown;
@@ -78,26 +61,28 @@ failure add_sound(const std::string &song_path, const std::string &page_path, bo
     return {};
 }
 
-std::string number_cell(const std::string &text, double value) {
+// Returns a cell of the index, which is empty if the song lacks the value.
+std::string number_cell(bool has_value, const std::string &text, double value) {
+    if (!has_value) return "<td></td>\n";
     return "<td class=\"number\" data-value=\"" + std::to_string(std::llround(value)) + "\">" +
            text + "</td>\n";
 }
 
 // Draws the loudness curve as a small picture.
 std::string miniature(const std::vector<float> &loudness) {
+    constexpr double kWidth = 140;
+    constexpr double kHeight = 28;
     if (loudness.size() < 2) return "";
     const auto top = static_cast<double>(*std::max_element(loudness.begin(), loudness.end()));
-    const double scale = top > 0.0 ? (kMiniatureHeight - 2) / top : 0.0;
-    const double step =
-        static_cast<double>(kMiniatureWidth) / static_cast<double>(loudness.size() - 1);
+    const double scale = top > 0.0 ? (kHeight - 2) / top : 0.0;
+    const double step = kWidth / static_cast<double>(loudness.size() - 1);
     std::string path;
     for (size_t k = 0; k < loudness.size(); ++k) {
         path += formatted("%c%.1f %.1f", k == 0 ? 'M' : 'L', static_cast<double>(k) * step,
-                          kMiniatureHeight - 1 - static_cast<double>(loudness[k]) * scale);
+                          kHeight - 1 - static_cast<double>(loudness[k]) * scale);
     }
-    return "<svg viewBox=\"0 0 140 28\" role=\"img\" aria-label=\"Loudness\"><path class=\"loud\" "
-           "d=\"" +
-           path + "\"/></svg>";
+    return formatted("<svg viewBox=\"0 0 %.0f %.0f\" ", kWidth, kHeight) +
+           "role=\"img\" aria-label=\"Loudness\"><path class=\"loud\" d=\"" + path + "\"/></svg>";
 }
 
 // page: relative to the index.
@@ -105,30 +90,18 @@ std::string index_row(const record &result, const result_json &view, const std::
     const auto duration = static_cast<double>(result.duration_ms);
     const auto beats = static_cast<double>(result.beats_ms.size());
     const double start = player_ms(result, result.hl_pos_ms);
-    const std::string nothing = "<td></td>\n";
-    const auto cell_if = [&](bool has_value, const std::string &text, double value) {
-        return has_value ? number_cell(text, value) : nothing;
-    };
     return "<tr><td class=\"name\"><a href=\"" + percent_encoded(page) + "\">" +
            html_text(base_name(result.file)) + "</a></td>\n" +
-           number_cell(clock_text(duration), duration) +
-           cell_if(result.has_beats, std::to_string(result.bpm), result.bpm) +
-           cell_if(result.has_highlight, clock_text(start), start) +
-           cell_if(result.has_beats, std::to_string(result.beats_ms.size()), beats) + "<td>" +
+           number_cell(true, clock_text(duration), duration) +
+           number_cell(result.has_beats, std::to_string(result.bpm), result.bpm) +
+           number_cell(result.has_highlight, clock_text(start), start) +
+           number_cell(result.has_beats, std::to_string(result.beats_ms.size()), beats) + "<td>" +
            miniature(view["loudness"]) + "</td></tr>\n";
 }
 
 // Path of the folder of the songs' pages, beside the index.
 std::string pages_folder(const options &opts) {
     return fs::path(opts.report).replace_extension().string() + "_songs";
-}
-
-// Returns the part of the index page before or after its rows.
-std::string index_part(bool is_before) {
-    const std::string page = kIndexPage;
-    const std::string key = "@ROWS@";
-    const size_t at = page.find(key);
-    return is_before ? page.substr(0, at) : page.substr(at + key.size());
 }
 
 }  // namespace
@@ -158,10 +131,10 @@ failure write_report_page(const record &result, const options &opts, const std::
     const std::string page = base_name(pages_folder(opts)) + "/" + base_name(target);
     row = index_row(result, view, page);
     if (failure failed = add_sound(result.file, target, opts.embed, view)) return failed;
-    // The title is replaced before the data, so that no text of a song is mistaken for a key.
-    const std::string with_data = filled(kSongPage, "@DATA@", script_json(view));
     const std::string title = html_text(base_name(result.file));
-    return write_file(target, filled(with_data, "@TITLE@", title), opts.force);
+    const std::string data = replaced(view.dump(), {{'<', "\\u003c"}});  // safe in a script element
+    const std::string content = kSongPage[0] + title + kSongPage[1] + data + kSongPage[2];
+    return write_file(target, content, opts.force);
 }
 
 std::string failed_report_row(const record &result) {
@@ -173,17 +146,18 @@ failure begin_report_index(output_file &index, const options &opts) {
     if (opts.report.empty() || takes_one_file(opts)) return {};
     if (failure failed = check_report(opts.report, opts.force)) return failed;
     const std::string folder = pages_folder(opts);
-    const int code = mkdir(folder.c_str(), 0777) == 0 ? 0 : errno;
-    std::error_code unreadable;
-    if (code == EEXIST && !fs::is_directory(fs::symlink_status(folder, unreadable))) {
+    std::error_code failed;
+    const fs::file_status there = fs::symlink_status(folder, failed);
+    if (fs::exists(there) && !fs::is_directory(there)) {
         return {"The folder " + shown(folder) +
                 " cannot be made: a symbolic link or a file has its name."};
     }
-    if (code != 0 && code != EEXIST) {
-        return {system_sentence("The folder " + shown(folder) + " cannot be made", code)};
+    fs::create_directory(folder, failed);
+    if (failed) {
+        return {system_sentence("The folder " + shown(folder) + " cannot be made", failed.value())};
     }
-    if (failure failed = begin_output(index, opts.report)) return failed;
-    return add_report_row(index, index_part(true));
+    if (failure refused = begin_output(index, opts.report)) return refused;
+    return add_report_row(index, kIndexPage[0]);
 }
 
 failure add_report_row(output_file &index, const std::string &row) {
@@ -195,6 +169,6 @@ failure add_report_row(output_file &index, const std::string &row) {
 
 failure finish_report_index(output_file &index, const options &opts) {
     if (index.fd < 0) return {};
-    if (failure failed = add_report_row(index, index_part(false))) return failed;
+    if (failure failed = add_report_row(index, kIndexPage[1])) return failed;
     return commit_output(index, opts.force);
 }
