@@ -8,7 +8,6 @@
 #include <cstdint>
 #include <filesystem>
 
-#include "cli/input/file_bytes.h"
 #include "cli/input/recognise.h"
 #include "cli/report/song_view.h"
 #include "cli/write/file_names.h"

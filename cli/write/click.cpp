@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <filesystem>
 
-#include "cli/input/file_bytes.h"
+#include "cli/input/recognise.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
