@@ -1,6 +1,5 @@
-# Builds as with the NDK's toolchain file, with the log and the codec library of this build instead of the device's,
-# and checks the result.
-# -DSOURCE=... -DDIRECTORY=... -DLIBRARIES=directory of liblog.so and libwexaaudio.so
+# Builds the library as with the NDK's toolchain file and checks the result. The log library and the codec library in
+# the directory LIBRARIES replace those of a device. Arguments: -DSOURCE=... -DDIRECTORY=... -DLIBRARIES=...
 file(REMOVE_RECURSE ${DIRECTORY})
 set(configure ${CMAKE_COMMAND} -S ${SOURCE} -B ${DIRECTORY} -G Ninja -DCMAKE_BUILD_TYPE=Release
   -DCMAKE_TOOLCHAIN_FILE=${CMAKE_CURRENT_LIST_DIR}/toolchain.cmake

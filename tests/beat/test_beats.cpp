@@ -1,4 +1,4 @@
-// Whole analyses of songs with known beats, and the click track.
+// Tests whole analyses of songs with known beats, and the click track.
 #include "beat/click_track.h"
 #include "beat/onset_envelope.h"
 #include "beat/threshold.h"
@@ -44,8 +44,7 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 }  // namespace
 
-// Quiet noise becomes loud. That onset is the first choice for a beat, although the onsets after
-// the later silences are much sharper.
+// The onset where quiet noise becomes loud comes first, although later onsets are sharper.
 TEST(Beats, PowerRiseForcesABeat) {
     std::mt19937 random(9);
     std::vector<double> song(90 * 11025);
@@ -60,8 +59,7 @@ TEST(Beats, PowerRiseForcesABeat) {
     EXPECT_NEAR(run.ctx.onset->beat_times[0], 50000.0, 100.0);
 }
 
-// The analysis checks for a stop before the envelope and again after the tempo. A stop that arrives
-// later, here at a thread of the threshold, has no effect.
+// A stop has an effect before the envelope and after the tempo, but not later.
 TEST(Beats, StopIsCheckedBeforeTheEnvelopeAndAfterTheTempo) {
     for (const auto &[start, tempo, beats] :
          {std::tuple{0, false, false}, {1, true, false}, {5, true, true}}) {

@@ -11,8 +11,8 @@ struct peak {
     double height;
 };
 
-// An envelope that is 0 except at its peaks. Those in `unselected` do not exceed the threshold,
-// because each is followed by a plateau of larger values, and a plateau is not a peak.
+// An envelope of peaks. Each of the `unselected` ones is below the threshold, because a plateau of
+// larger values follows it.
 struct envelope {
     int64_t length;
     int32_t bpm;
@@ -74,8 +74,8 @@ TEST(Candidates, WindowThatNearlyFitsIsCut) {
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
 }
 
-// Up to 95 BPM beats are at least 3 s apart, at higher tempos 1 s, rounded up to whole periods. A
-// gap is filled if it is longer than three of these distances or at least 6 s long.
+// Beats are at least 3 s apart up to 95 BPM, otherwise 1 s, rounded up to whole beat periods. A gap
+// is filled if it exceeds three of these distances or lasts 6 s.
 TEST(Candidates, SmallestDistanceAndLongGapDependOnTheTempo) {
     const std::tuple<int32_t, int64_t, int64_t, size_t> cases[] = {
         {96, 52, 0, 1},    {96, 53, 0, 2},    {95, 134, 0, 1},   {95, 135, 0, 2},
@@ -88,8 +88,7 @@ TEST(Candidates, SmallestDistanceAndLongGapDependOnTheTempo) {
     }
 }
 
-// A rise selects the nearest peak, except the last one. Peaks close to a selected one are ignored,
-// even if they are larger.
+// A rise selects the nearest peak, except the last one. Other peaks near it are ignored.
 TEST(Candidates, RiseNeedsNoThreshold) {
     envelope env = {1000, 120, {{100, 20}, {400, 21}}, {{300, 2}, {330, 3}}};
     EXPECT_EQ(find_beats(env), (frames{100, 330, 400}));

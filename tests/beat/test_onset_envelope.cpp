@@ -89,8 +89,7 @@ TEST(BeatCtx, OneSecondHas42Frames) {
     EXPECT_TRUE(feat_mutex_mt == nullptr && feat_cond_mt == nullptr);
 }
 
-// The frame and hop sizes come from the arguments, not from the context. The input includes
-// silence, non-finite samples and weights, and weights that are negative or zero.
+// The input includes silence, NaN, infinities, and weights that are negative or zero.
 TEST(OnsetEnvelope, EqualsTheFramesComputedOneByOne) {
     std::mt19937 random(6);
     const auto below = [&](uint32_t limit) { return static_cast<int32_t>(random() % limit); };

@@ -23,7 +23,7 @@ int32_t estimate(std::vector<double> env, const std::vector<pulse_pair> &pairs =
 }  // namespace
 
 // Each pair of pulses correlates only at its own lag. A lag of 20 frames is 129 BPM, 27 is 95 BPM.
-// Where two rows differ only slightly in a weight, different tempos win.
+// If two rows differ only slightly in a weight, a different tempo wins.
 TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     const struct {
         std::vector<std::pair<size_t, double>> weights;  // of each lag

@@ -50,7 +50,7 @@ class Inputs(Case):
         self.put(deep)
         self.put("-dash.wav")
         self.assertEqual(self.found("--", "-dash.wav", deep), [b"-dash.wav", deep.encode()])
-        # In text each name is on one line and has no control characters.
+        # In text output each name is on one line and has no control characters.
         done = self.run_tavo("--mode", "highlight", *ODD_NAMES, b"no\nsuch\x1b\xe9", status=1)
         self.assertEqual(done.stderr, rb"tavo: no\nsuch\x1B\xE9: The file does not exist." + b"\n")
         lines = done.stdout.decode("utf-8").split("\n")

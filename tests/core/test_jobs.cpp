@@ -69,8 +69,7 @@ int32_t read_nothing(mtsrc_ctx *, int32_t, mtsrc_frame *) {
     return TAVO_ERR_READ;
 }
 
-// The modes with beats report a failed decoding or conversion, together with a highlight that was
-// found before it. In mode 0 only tavo_has_audio reports the failure.
+// Only the modes with beats report a failure. A highlight may have been found before it.
 TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     for (const bool decodes : {false, true}) {
         for_each_mode(kModes, [decodes](int32_t mode, TAVO_CTX *ctx) {

@@ -164,9 +164,7 @@ int32_t read_after_stop(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
     return original_get_frm(src, want, frame);
 }
 
-// After a stop during decoding the job still decodes everything and finds the highlight, but it
-// skips the beats. This also holds if the watcher, the thread that waits for the job, cannot be
-// started.
+// A stop during decoding skips only the beats. It also works without a watcher thread.
 TEST(Lifecycle, StopDuringDecodingSkipsTheBeats) {
     for (const bool watched : {true, false}) {
         for_each_mode(kModes, [watched](int32_t mode, TAVO_CTX *ctx) {

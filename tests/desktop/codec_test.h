@@ -1,4 +1,4 @@
-// Helpers for tests that read encoded files, which tests/support/make_songs.sh makes.
+// Helpers for tests that read the encoded files made by tests/support/make_songs.sh.
 #ifndef TAVO_TESTS_DESKTOP_CODEC_TEST_H
 #define TAVO_TESTS_DESKTOP_CODEC_TEST_H
 

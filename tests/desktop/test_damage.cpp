@@ -1,5 +1,5 @@
-// Damaged files of every format: audio far from the damage is unchanged. fuzz/source.cpp tests what
-// any damage could break.
+// Tests that damage does not change audio far from it, in every format. fuzz/source.cpp tests that
+// damaged files do no harm.
 #include "tests/desktop/codec_test.h"
 
 namespace codec_test {
@@ -63,7 +63,7 @@ TEST_P(DamagedFile, IsUnchangedFarFromTheDamage) {
     const samples whole = read_all(fixture(GetParam().file));
     for (int k = 0; k < kOffsets; ++k) {
         const size_t at = file.size() / 4 + random() % (file.size() / 4);
-        // A truncated file delivers the start of the whole song.
+        // A truncated file has the same samples, except for its last ones.
         const samples cut = read_all(save("cut", file.substr(0, at)));
         ASSERT_GT(cut.size(), whole.size() / 10);
         ASSERT_LT(cut.size(), whole.size() * 3 / 4);

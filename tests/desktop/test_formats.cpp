@@ -1,4 +1,4 @@
-// The readers of every format, with real files.
+// Tests the readers of every format with real files.
 #include <cstdlib>
 #include <cstring>
 
@@ -79,7 +79,7 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
         const char *file, *reference;
         size_t front = 0, end = 0;  // samples of the reference that the file lacks
     } pairs[] = {
-        // FLAC is lossless, whatever its blocks are and with or without a seek table.
+        // FLAC is lossless with blocks of any size, and with or without a seek table.
         {"song.flac", "song.wav"},
         {"no_table.flac", "song.wav"},
         {"mono.flac", "mono.wav"},
@@ -88,7 +88,7 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
         {"golden/variable.flac", "golden/plain.flac", 0, 1408},
         // The frame with the encoder's table is skipped.
         {"vbr.mp3", "vbr_no_table.mp3"},
-        // The same frames in different containers, with or without other streams.
+        // The container and its other streams do not change the samples.
         {"golden/program.aac", "golden/plain.aac"},
         {"golden/he.m4a", "golden/he_every.aac"},
         {"last.m4a", "low.aac"},
@@ -208,11 +208,11 @@ TEST(Reader, SkipsTagsAndGarbage) {
     for (const char *name : {"Info", "VBRI"})
         expect_equal(read_all(save("table.mp3", file.replace(kTable, 4, name))), plain);
     const std::string ogg = load(fixture("golden/plain.ogg"));
-    // An ID3v2.3 tag of 600 bytes that resemble frames of another stream.
+    // The bytes of this ID3v2.3 tag resemble frames of another stream.
     std::string id3v2 = "ID3\3\0\0\0\0\4\x58"s;
     while (id3v2.size() < 610) id3v2 += "\xFF\xFB" + std::string(102, '\x10');
     id3v2.resize(610);
-    // An APE tag of 4,000 bytes that are frames of this stream, and its footer.
+    // The bytes of this APE tag are frames of this stream.
     const std::string ape =
         file.substr(20'000, 4000) + "APETAGEX\xD0\7\0\0\xC0\x0F\0\0"s + support::zeros(16);
     const std::string id3v1 = "TAG" + support::zeros(125);

@@ -1,4 +1,4 @@
-// The shared object that libwexaaudio.so loads on demand, and the scans that its readers share.
+// Tests that libwexaaudio.so loads its shared object on demand, and that its readers share scans.
 #include <dlfcn.h>
 
 #include <cstdlib>
@@ -55,8 +55,8 @@ TEST(Library, LogsAMissingSharedObject) {
     dlclose(library);
 }
 
-// Readers share the scan of a file and its tags until the file is replaced. Without a reader, the
-// scan is kept only if the file was not written just before it.
+// Readers of a file share one scan until the file is replaced. The scan outlives them, unless the
+// file was written just before it.
 TEST(ScanCache, ScansAFileOnce) {
     static int64_t bytes_read;
     std::string tags;  // many short tags after the audio

@@ -15,21 +15,20 @@ samples make_samples(size_t count) {
     return pcm;
 }
 
-// Returns the file with a number of `size` bytes replaced at offset `at`.
+// Returns the file with a little-endian number of `size` bytes at offset `at`.
 std::string patch(std::string file, size_t at, uint64_t value, size_t size = 2) {
-    return file.replace(at, size, reinterpret_cast<const char *>(&value), size);  // little-endian
+    return file.replace(at, size, reinterpret_cast<const char *>(&value), size);
 }
 
 TEST(Wav, ReadsUnusualHeaders) {
     const samples pcm = make_samples(60000);
     const std::string file = support::wav_bytes(pcm, 44100, 2), data = file.substr(kData);
     const auto with_size = [&](uint64_t bytes) { return patch(file, kData + 4, bytes, 4); };
-    // The 22 bytes of an extensible format: 16 valid bits, no speaker positions, PCM.
+    // An extensible format adds these bytes: 16 valid bits, no speaker positions, PCM.
     const std::string extension = "\26\0\20\0\0\0\0\0\1\0\0\0\0\0\20\0\x80\0\0\xAA\0\x38\x9B\x71"s;
     const std::string plain = file.substr(0, kData);
     const std::string format = patch(patch(plain, kFormat + 8, 0xFFFE), kFormat + 4, 40);
-    // Chunks of odd length. A reader that ignores the padding byte finds a false data chunk in
-    // them.
+    // A reader that ignores the padding byte of an odd chunk finds a false data chunk in these.
     const std::string odd = "LIST\15\0\0\0INFOdata\1\0\0\0\7\0JUNK\5\0\0\0ddddd\0"s;
     const struct {
         const char *name;

@@ -1,4 +1,4 @@
-// Peaks, searches, sorts and statistics of known lists. fuzz/toolkit.cpp tests random ones.
+// Tests peaks, searches, sorts and statistics with known lists. fuzz/toolkit.cpp uses random ones.
 #include <gtest/gtest.h>
 #include <pthread.h>
 

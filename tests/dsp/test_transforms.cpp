@@ -1,5 +1,5 @@
-// The FFT, the transforms of any size and the mel scale of known values.
-// fuzz/toolkit.cpp tests random ones.
+// Tests the FFT, the transforms of any size and the mel scale with known values. fuzz/toolkit.cpp
+// uses random ones.
 #include <gtest/gtest.h>
 
 #include <cmath>

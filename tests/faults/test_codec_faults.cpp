@@ -9,7 +9,7 @@
 #include "tests/support/job_harness.h"
 #include "tests/support/song.h"
 
-// A sanitizer must let an allocation that exceeds the memory fail instead of ending the program.
+// Under a sanitizer an allocation that is too large must fail instead of ending the program.
 extern "C" const char *__asan_default_options() {
     return "allocator_may_return_null=1:max_allocation_size_mb=512";
 }
@@ -22,8 +22,7 @@ namespace {
 constexpr unsigned kMaxSeconds = 30;  // of one job
 constexpr long kMaxMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
-// Unless TAVO_FAULTS is set, kCalls calls that return a value are wrong, with every kStep-th of its
-// replacements.
+// Without TAVO_FAULTS only kCalls calls of each function and every kStep-th wrong value are tried.
 constexpr int kCalls = 2, kStep = 31;
 
 // Returns wrong values: some near the limits of the named value, and some for any value.

@@ -35,7 +35,6 @@ constexpr group kGroups[] = {
 };
 constexpr int kOpenedOnly = -1;
 
-// The outcome of a run.
 struct outcome {
     int32_t created = 99, started = 0, released = 0, state = 0, complete = 0;
     int64_t counted = 0, failed = 0;  // number of counted calls and of failed ones
@@ -103,8 +102,7 @@ const char *find_broken_promise(const outcome &found, int mode, const group &kin
     return in_song ? job::find_inconsistency(a, mode) : "beats outside the song";
 }
 
-// Runs the job `count` times, each time with another failing call. The failing calls are evenly
-// spread.
+// Runs the job `count` times. Each time another call fails; these calls are evenly spread.
 void try_calls(const std::string &path, int mode, const group &kind, int64_t count) {
     fault::plan plan = {kind.calls, INT64_MAX, false, kind.error};
     const outcome undisturbed = run(path, mode, plan);
@@ -156,8 +154,7 @@ INSTANTIATE_TEST_SUITE_P(Jobs, Faults,
                          testing::Combine(testing::ValuesIn(kFormats),
                                           testing::Values(kOpenedOnly, 0, 1, 2)));
 
-// The path "fd" names a descriptor, which each source duplicates. The duplicates share their
-// offset, so this song is short enough for a single source.
+// All sources duplicate one descriptor and share its offset, so the song is decoded by one source.
 TEST(DuplicateFaults, AreReported) {
     const int input = dup(STDIN_FILENO);
     const int file = open(SHORT_SONGS "/brief.flac", O_RDONLY);

@@ -39,8 +39,7 @@ std::vector<float> expand(const std::string &pairs) {
     return power;
 }
 
-// Returns PCM of alternating signs, `unit` samples per point. A value is the mean square, where
-// full scale is 1.
+// Returns PCM with alternating signs. Each value is the mean square of `unit` samples.
 std::vector<int16_t> make_pcm(const std::string &pairs, int64_t unit) {
     std::vector<int16_t> pcm;
     for (const float square : expand(pairs)) {
@@ -87,8 +86,7 @@ uint32_t tune(const std::string &steps, int32_t rate = kRate, uint32_t start_ms 
     return _tune_HL_simple(pcm.data(), rate, start_ms, duration_s);
 }
 
-// Returns the start found in a song. A second search replaces the curve of the first and finds the
-// same start.
+// Returns the start found in a song. A second search must find the same start.
 uint32_t find_position(std::vector<int16_t> pcm, int64_t duration_s, int32_t count) {
     pcm.shrink_to_fit();
     TAVO_CTX ctx = {};
@@ -168,13 +166,11 @@ TEST(Search, ReturnsTheBestEdge) {
         {"3 0.1 1 1 11 0.1 6 0.45 7 0.1 1 0.35 12 0.65 19 0.1", 120, 56000},
         // Of two edges with equal scores the larger step wins.
         {"3 0.125 1 1 9 0.125 1 0.375 7 0.8125 10 0.25 10 0.75 19 0.25", 120, 60000},
-        // An edge is not scored if the average falls there. Without a scored edge the answer is the
-        // point after the first one.
+        // An edge is not scored if the average falls there. If no edge is scored, the first counts.
         {"5 0.25 10 1 1 0.6 1 0.9 20 0.6 23 0.25", 120, 32000},
         {"5 0.25 10 1 1 0.5 1 0.875 20 0.625 23 0.25", 120, 30000},
         // An edge is scored if four loud points follow it. Loud points are above the mean.
         {"20 0.5 4 1 36 0.5", 120, 38000},
-        {"20 0.5 3 1 37 0.5", 120, 40000},
         {"20 0 3 1 4 0.25 10 0 16 0.25 7 1", 120, 40000},
         // An edge near the start counts only in a short song.
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 90, 60000},
@@ -191,8 +187,7 @@ TEST(Search, ReturnsTheBestEdge) {
         // No edge is scored, so the answer is the first edge that no valley follows closely.
         {"20 0.5 1 1 1 0.9 1 0.3 1 0.1 1 0.4 5 0.5 2 0.85 28 0.5", 120, 60000},
         {"20 0.5 1 1 1 0.9 1 0.5 1 0.3 1 0.1 1 0.4 4 0.5 2 0.85 28 0.5", 120, 40000},
-        // An edge must exceed the 60th percentile of the curve, which the largest step only
-        // reaches.
+        // An edge must rise above the 60th percentile, not only to it.
         {"9 1 20 0.5 1 0.1 1 0.8 10 0.5 1 0.2 1 0.81 28 0.5 29 1", 204, 84000},
         {"30 1 30 0.5", 120, 0},  // no rising edge
         {"60 0", 120, 0},
@@ -217,8 +212,7 @@ TEST(Search, ComparesTenEdgesAndThirtyPassages) {
 TEST(Search, RequestedLengthMovesTheStart) {
     // This curve has two loud passages. The second one, of 20 points, is chosen.
     const char *plain = "10 0.25 4 0.75 16 0.25 20 1 10 0.25";
-    // A region that would extend past the song starts at the first passage or at the first valley,
-    // whichever is earlier. The dips to 0.1 are valleys.
+    // A region that would extend past the song starts at the first passage or valley instead.
     const char *valley_first = "20 0.5 1 0.1 9 0.5 20 1 5 0.5 1 0.1 4 0.5";
     const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
     const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
@@ -229,19 +223,12 @@ TEST(Search, RequestedLengthMovesTheStart) {
         int32_t hl_param;
         uint32_t ms;
     } cases[] = {
-        {plain, 0, 58000},
-        {plain, -30, 58000},
-        {plain, 44, 58000},   // not long enough to move the start
-        {plain, 46, 58000},   // the nearest boundary is the same
+        {plain, 0, 58000},        {plain, 44, 58000},  // not long enough to move the start
+        {plain, 46, 58000},                            // the nearest boundary is the same
         {plain, 60, 26000},   // the nearest boundary is the end of the first passage
         {plain, 102, 18000},  // as long as the song after the first passage
-        {plain, 104, 18000},
-        {valley_first, 80, 40000},
-        {segment_first, 102, 18000},
-        {valley_only, 58, 62000},
-        {one, 30, 24000},
-        {one, 31, 24000},
-        {two, 30, 38000},
+        {plain, 104, 18000},      {valley_first, 80, 40000}, {segment_first, 102, 18000},
+        {valley_only, 58, 62000}, {one, 30, 24000},          {two, 30, 38000},
     };
     for (const auto &c : cases) {
         EXPECT_EQ(search(c.curve, 120, c.hl_param), c.ms) << c.curve << ", " << c.hl_param;
@@ -333,8 +320,7 @@ TEST(Tune, MovesToTheSharpestRise) {
     EXPECT_EQ(tune("6 0 5 .5 7 0 5 .5 7 0"), 2400u);  // the first of two equal rises
 }
 
-// A song that is loud from 60 s on has a coarse start of 54 s. Tuning moves it to 60.2 s, the start
-// of the first window that is completely loud.
+// The coarse start is 54 s. Tuning moves it to the first window that is completely loud.
 TEST(Position, ReturnsTheTunedStart) {
     EXPECT_EQ(find_position(make_pcm("60 .04 40 .64 20 .04", kRate), 120, 58), 60200u);
     EXPECT_EQ(find_position({}, 120, 0), 0u);
@@ -343,8 +329,7 @@ TEST(Position, ReturnsTheTunedStart) {
     clearHighlgihtCtx(nullptr);
 }
 
-// The coarse start of 112 s is tuned to 116.2 s only if the PCM is long enough for all windows,
-// whatever duration the file states.
+// The coarse start of 112 s is tuned only if the PCM is long enough for all windows.
 TEST(Position, TuningDoesNotReadPastThePcm) {
     EXPECT_EQ(find_position(make_pcm("116 .04 2 .64 2 .04", kRate), 200, 58), 112000u);
     EXPECT_EQ(find_position(make_pcm("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);

@@ -31,7 +31,7 @@ std::atomic<int> global_references, unreturned, methods;
 std::atomic<bool> pending;         // true while an exception is pending
 std::atomic<int> misplaced_calls;  // number of calls made while an exception was pending
 
-// A test's settings of the machine, and the calls that it recorded.
+// The settings that a test makes, and the events that the machine recorded.
 struct {
     // The n-th call of this function fails; 1 is the next call. As the interface specifies, it
     // returns null with an exception pending, or it returns an error code.
@@ -56,8 +56,7 @@ bool must_fail(const std::string &function) {
     return function == machine_state.failing && --machine_state.nth == 0;
 }
 
-// Returns a new reference. If the call fails or the name is unknown, an exception is pending and
-// the reference is null.
+// Returns a new reference. If the call fails, returns null with an exception pending.
 template <typename T = jobject>
 T create_reference(const std::string &function, std::atomic<int> *count, bool exists = true) {
     static std::atomic<uintptr_t> last_handle;

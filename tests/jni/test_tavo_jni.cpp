@@ -59,7 +59,7 @@ struct Jni : testing::Test {
     }
 };
 
-// This must be the first test in this file, because none of the bridge's state may exist yet.
+// This must be the first test in the file, because it needs a bridge without any state.
 TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     TAVO_INFO info = {};
     tavocallback(&info);  // no virtual machine
@@ -67,7 +67,7 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     EXPECT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), -1);
     ASSERT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), 0x10006);
 
-    // Callbacks before init: without the host class, without its method, and with both.
+    // Before init, a callback finds no host class, then a class without its method, then both.
     call_back_on_a_thread(info);
     EXPECT_EQ(machine_state.log_lines, kNotAttached + kNotNotified);
     machine_state = {"GetStaticMethodID"};
@@ -81,8 +81,7 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     EXPECT_EQ(machine_state.log_lines, kNotNotified + kNoInstance);
     EXPECT_EQ(tavo_jni_mutex, nullptr);
 
-    // An existing lock is used, not replaced. The bridge requests the path's characters before it
-    // takes the lock and releases them while it holds the lock.
+    // An existing lock is used. It is free while the path is read and held while it is released.
     pthread_mutex_t existing_lock = PTHREAD_MUTEX_INITIALIZER;
     tavo_jni_mutex = &existing_lock;
     std::vector<int> trials;
@@ -102,8 +101,7 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     expect_references(2);
 }
 
-// Calls inside an event do not wait for the lock, even while deinit holds it on another thread and
-// waits for the event.
+// Calls inside an event fail at once, even while deinit holds the lock on another thread.
 TEST_F(Jni, JobIsOpenedStartedAndEndedOnce) {
     numbers inside;
     machine_state.watched = "CallStaticVoidMethod";
@@ -175,8 +173,7 @@ TEST_F(Jni, OneEventCarriesTheResultWhateverFails) {
     }
 }
 
-// Here the callback runs on a thread that was already attached and stays so. The references that an
-// event uses stay valid until the event returns.
+// The references that an event uses stay valid until it returns, even if setup replaces them.
 TEST_F(Jni, RepeatedSetupReplacesTheReferences) {
     ASSERT_EQ(init(), 0);
     TAVO_INFO info = {};

@@ -1,4 +1,4 @@
-// One file for each format source, and a fixture that opens and reads these files. The fake codec
+// Defines a file for each format source, and a fixture that opens and reads them. The fake codec
 // library determines what the decoders deliver.
 #ifndef TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 #define TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H

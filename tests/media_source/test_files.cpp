@@ -1,4 +1,4 @@
-// The file callbacks, and recognition of hand-made file heads.
+// Tests the file callbacks, and the recognition of formats with hand-made files.
 #include <sys/mman.h>
 #include <sys/stat.h>
 
@@ -50,8 +50,7 @@ TEST(FileIo, CallbacksReadWriteAndSeek) {
     EXPECT_EQ(mtsrc_file_close(new (malloc(sizeof handle)) mtsrc_file{-1}), 0);
 }
 
-// Returns the recognised type of the content, or an error code. The record lacks the callbacks that
-// recognition must not use.
+// Returns the recognised type or an error code. Recognition needs only these callbacks.
 int32_t type_of(std::string content, decltype(mtsrc_io::seek) seek = mtsrc_file_seek) {
     mtsrc_io io = {};
     io.read = mtsrc_file_read;
@@ -112,8 +111,7 @@ std::string pair(const std::string &header, size_t distance) {
     return put(header, distance, header + zeros(1));
 }
 
-// A frame consists of slots of one byte, or of four bytes in Layer I. Their number depends on the
-// bitrate, the sample rate and the padding, which adds one slot.
+// A frame consists of slots of one byte, or of four bytes in Layer I. Padding adds one slot.
 TEST(ProbeMpeg, FindsTwoHeadersOneFrameLengthApart) {
     using list = std::vector<size_t>;
     const list kbit1 = {32, 64, 96, 128, 160, 192, 224, 256, 288, 320, 352, 384, 416, 448};
@@ -181,8 +179,7 @@ TEST(ProbeMpeg, ScanContinuesAfterARejectedCandidate) {
         expect_type(305, {before + kLayer3Pair});
         expect_type(2199, {before, zeros(kScanBytes - inside) + "ID3\3" + zeros(5)});
     }
-    // Ogg, program streams and transport streams are not scanned. A transport stream is recognised
-    // by a sync byte at offset 188 of the file, even if the content starts later.
+    // Ogg, program streams and transport streams (with a sync byte at 188) are not scanned.
     const std::string sync = "\x47" + kLayer3Pair;
     expect_type(2199, {"OggS" + kLayer3Pair, "\0\0\1\xBA"s + kLayer3Pair});
     expect_type(2199, {put(sync, 188 - kBefore, "\x47"), "\x47"});

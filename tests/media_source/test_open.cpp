@@ -1,4 +1,4 @@
-// Opening and closing, through mtsrc.h and through the operations of each format.
+// Tests opening and closing a source, through mtsrc.h and through the operations of each format.
 #include <fcntl.h>
 
 #include <tuple>
@@ -30,8 +30,7 @@ TEST_F(OpenClose, OpenCallsTheCodecLibraryInOrder) {
     });
 }
 
-// After a failed step the codec library is de-initialised twice: by the format's open, and by
-// mtsrc_open_mfal, which then closes the source.
+// After a failure, the format's open and mtsrc_open_mfal both de-initialise the codec library.
 TEST_F(OpenClose, AFailedStepIsCleanedUp) {
     for_each_row([&](const source_row &row) {
         const size_t libraries = row.decoder.empty() ? 0 : row.tag ? 2 : 1;

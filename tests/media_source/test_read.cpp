@@ -1,4 +1,4 @@
-// Reads, seeks and resets of a source, whose frames pass through the decoder and the queue.
+// Tests reads, seeks and resets of a source, whose frames pass through a decoder and a queue.
 #include "tests/media_source/source_case.h"
 
 namespace {
@@ -8,8 +8,7 @@ using frames = std::vector<fake_codec::frame>;
 
 constexpr int32_t kAll = 900'000;  // bytes; more than any stream here, less than the queue's size
 
-// Returns a frame of one stereo pair, which does not start at 0 as the first frame of a stream
-// does.
+// Returns a frame of one stereo pair, which is not the first frame of its stream.
 fake_codec::frame pair_frame(int16_t value, int32_t decode_result = 0, int32_t produced = 1) {
     return {{value, value}, 1000 + value, 0, decode_result, produced};
 }
@@ -73,9 +72,8 @@ TEST_F(Reading, FramesAreDecodedIntoTheQueue) {
     });
 }
 
-// A frame that cannot be decoded is skipped, and the decoder is reset. A second one in a row makes
-// the read fail, as do a failed read of a frame and an impossible byte count. Samples that were
-// already in the queue are delivered by the next read.
+// One undecodable frame is skipped after a reset of the decoder. A second one, a failed read or an
+// impossible byte count makes the read fail. The next read delivers what the queue holds.
 TEST_F(Reading, OneUndecodableFrameIsSkipped) {
     for_each_row([&](const source_row &row) {
         const int32_t too_many =
@@ -177,8 +175,7 @@ TEST_F(Reading, RequestsOfAnySizeAreDelivered) {
     EXPECT_EQ(read(-1).first, -4);
     EXPECT_EQ(mtsrc_getstream(src, 10, &no_data), -4);
     EXPECT_EQ(mtsrc_getstream(src, 10, nullptr), -4);
-    // When only one more frame would fit, the queue moves its bytes to its start before it is
-    // filled.
+    // If only one more frame fits, the queue first moves its bytes to its start.
     for (int16_t i = 0; i < 63; ++i) EXPECT_EQ(read(16'384), result(0, samples(8192, i)));
     expect_queue(1'032'192, 1'032'192);
     EXPECT_EQ(read(2), result(0, {63}));

@@ -93,8 +93,7 @@ class song_plan : public testing::Test {
         EXPECT_TRUE(fake_codec::state.objects.empty());
         EXPECT_TRUE(fake_codec::state.misuses.empty());
     }
-    // Returns the code of tavo_decode_init. Each source delivers `stream`, starting at its
-    // segment's position.
+    // Plans the decoding and returns the code. Sources deliver `stream` from their segments on.
     int32_t plan(int64_t duration, int32_t rate, const std::string &stream = {}) {
         release();
         std::ofstream(file.path) << head;

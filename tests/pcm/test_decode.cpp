@@ -63,8 +63,7 @@ TEST_F(DecodePlan, RefusesShortStreamsAndSegmentsTheOthers) {
             EXPECT_TRUE(seg.duration == each.duration && seg.fmt.sample_rate == each.rate);
         }
     }
-    // A second plan never uses more records than the first one allocated, and it leaves `got`
-    // unchanged.
+    // A second plan uses no more records than the first one, and it leaves `got` unchanged.
     ASSERT_EQ(plan(50'000'000, kRate), 0);
     free(ctx.pcm);
     free(ctx.seg[0].buf);

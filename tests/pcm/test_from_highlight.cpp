@@ -13,7 +13,7 @@ constexpr int64_t kBlock = 4608;            // offset of the compared block afte
 
 using positions = std::vector<int64_t>;
 
-// A stream of 20 s at 8000 Hz, decoded in four segments for mode 2.
+// A fixture for a stream of 20 s at 8000 Hz, decoded in four segments for mode 2.
 class FromHighlight : public song_plan {
  protected:
     void decode(const std::string &played) {
@@ -22,8 +22,7 @@ class FromHighlight : public song_plan {
         ctx.ana_rate = kAnalysisRate;
         ASSERT_EQ(DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes), kBytes);
     }
-    // Expects that the analysis signal for a highlight at `pos` ms consists of `bytes`, and that
-    // the highlight is then reported at `hl_pos`.
+    // Expects that a highlight at `pos` is reported at `hl_pos` and that `bytes` follow it.
     void expect_from(int64_t pos, const std::string &bytes, uint32_t hl_pos) {
         EXPECT_EQ(tavo_get_from_here(&ctx, pos), 0);
         EXPECT_EQ(ctx.pcm, nullptr);

@@ -22,7 +22,7 @@ state_ptr prepare(int32_t source, int32_t target = kAnalysisRate, int32_t code =
 signal_run average(int32_t source, int32_t target, int64_t first, int64_t n, const sample_run &in,
                    int64_t base = 0) {
     const int64_t count = base + int64_t(in.size());
-    // The pages of a block from calloc take no memory until they are written.
+    // Pages of zeros from calloc take no memory, so a large `base` is cheap.
     auto *input = static_cast<int16_t *>(calloc(size_t(count) + 1, sizeof(int16_t)));
     std::copy(in.begin(), in.end(), input + base);
     signal_run out(size_t(n) + 1, -1.0);
@@ -50,8 +50,7 @@ TEST(ResampleBlock, AveragesBlocks) {
               (signal_run{1.66666662693023681640625, 3.5, 6}));
 }
 
-// The expected values come from a separate computation in the same precisions. Only the last bit of
-// the sine may differ.
+// The expected values come from a separate computation. The last bit of the sine may differ.
 TEST(ResampleSinc, TableHoldsTheWindowedSinc) {
     for (const auto &[rate, phase, tap, want] : {std::tuple{48000, 0, 9, 0.20671874284744263},
                                                  {48000, 240, 0, -5.7826164265861735e-6},
@@ -121,7 +120,7 @@ TEST(ResampleSinc, RefusesBadArgumentsAndPhases) {
     drifting->ratio = 1.125f;
     EXPECT_EQ(slice(filter(drifting, in), 2, 6), (sample_run{0, 0, 5, 77}));
     EXPECT_EQ(filter(drifting, in).back(), -1);
-    // The end is compared in single precision, in which the last position is past the input.
+    // Single precision rounds the last position to one past the input, which ends the conversion.
     constexpr int32_t kLong = (1 << 27) + 12;
     auto *silence = static_cast<int16_t *>(calloc(kLong, sizeof(int16_t)));
     drifting->taps = 20;
@@ -157,8 +156,7 @@ int32_t convert(TAVO_CTX *ctx) {
                             &ctx->ana_len, &ctx->ana);
 }
 
-// A conversion in a job may reuse the memory of the PCM. fuzz/stages.cpp compares
-// dorn_resampler_run with a plain implementation.
+// A job converts its PCM in place: the output reuses the memory of the PCM.
 TEST(ResampleRun, InPlaceConversionIsBitIdentical) {
     const std::string bytes = noise(40'003, 5);
     for (const int32_t rate : {8000, 11025, 33075, 44100, 48000, 96000}) {

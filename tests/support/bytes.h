@@ -1,4 +1,4 @@
-// Byte strings and files for tests.
+// Helpers that make byte strings and files for tests.
 #ifndef TAVO_TESTS_SUPPORT_BYTES_H
 #define TAVO_TESTS_SUPPORT_BYTES_H
 

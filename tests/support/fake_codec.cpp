@@ -63,8 +63,7 @@ std::string kind_of_call() {
     return name.substr(0, name.find('_'));
 }
 
-// Returns the object of a handle. If no object of that kind has the handle, records a misuse and
-// returns null.
+// Returns the object of a handle. If there is none of that kind, records a misuse.
 object *find_object(const void *handle, const std::string &kind = kind_of_call()) {
     for (object &each : state.objects) {
         if (&each == handle && each.kind == kind) return &each;

@@ -30,8 +30,7 @@ struct frame {
     std::optional<int32_t> read_bytes = {};  // false size of the frame, reported by the reader
 };
 
-// The reply to a seek. A seek for which there is no reply moves to the last frame that starts at or
-// before the requested position.
+// The reply to a seek. By default, a seek moves to the last frame at or before its position.
 struct seek_reply {
     int32_t result = 0;
     std::optional<int64_t> reached = {};  // if empty, *reached is left unchanged
@@ -71,8 +70,7 @@ struct call {
 using replacement = int64_t (*)(const std::string &function, const std::string &value,
                                 int64_t original);
 
-// The object of a handle. `reserved` must be the first field, because the FLAC source sets a flag
-// in it before every read. The read clears the flag.
+// The object of a handle. `reserved` comes first, because the FLAC source sets a flag there.
 struct object {
     uint8_t reserved[4096] = {};
     std::string kind = {};  // for example "xaacfd", created by xaacfd_create
@@ -85,8 +83,7 @@ struct object {
 
 struct library_state {
     std::deque<stream_spec> streams = {stream_spec()};  // a new reader uses the last one
-    // For each function, the results of its next calls. An object is only created if the result is
-    // 0.
+    // Results of each function's next calls. An object is created only if its result is 0.
     std::map<std::string, std::deque<int32_t>> results = {};
     std::vector<call> calls = {};           // the latest calls; if `replace` is set, only the last
     std::list<object> objects = {};         // the objects that exist

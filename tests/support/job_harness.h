@@ -49,8 +49,7 @@ inline result wait() {
     return last;
 }
 
-// Returns null if the result is consistent with its mode and status, otherwise the name of the
-// inconsistent part.
+// Returns null if the result is consistent, otherwise the name of the inconsistent part.
 inline const char *find_inconsistency(const result &found, int mode) {
     const auto &list = found.beats;
     const bool beats = found.status == 0 && mode != TAVO_MODE_HIGHLIGHT;
@@ -64,7 +63,7 @@ inline const char *find_inconsistency(const result &found, int mode) {
 
 inline char current_run[256];  // describes the run; printed if it crashes or takes too long
 
-// Lets current_run be printed if the program crashes or alarm() expires, which ends the program.
+// Arranges that current_run is printed if the program crashes or an alarm() expires.
 inline void report_interruptions() {
     for (const int number : {SIGALRM, SIGSEGV, SIGABRT}) {
         signal(number, [](int) {

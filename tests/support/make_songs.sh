@@ -29,7 +29,6 @@ cd "$out/codec"
 "$make_song" song96.wav --seconds 6 --rate 96000
 "$make_song" six.wav --seconds 6 --channels 6
 
-# MPEG audio
 lame --quiet -b 128 -t song.wav cbr.mp3
 lame --quiet -b 320 -h -t song48.wav cbr48.mp3
 lame --quiet -V 2 song.wav vbr.mp3
@@ -40,7 +39,6 @@ lame --quiet -b 56 -t song22.wav lsf.mp3
 lame --quiet -b 8 -m m --resample 8 -t song.wav low.mp3
 convert song.wav layer2.mp2 -c:a mp2 -b:a 192k
 
-# FLAC
 flac --totally-silent -5 -o song.flac song.wav
 flac --totally-silent -5 --no-seektable -T 'TITLE=A Title' -o no_table.flac song.wav
 flac --totally-silent -5 -o mono.flac mono.wav
@@ -50,7 +48,7 @@ flac --totally-silent -5 -o wide.flac wide.wav
 convert song.wav noise.wav -c:a pcm_s24le -af 'aeval=random(0)*1.8-0.9|random(1)*1.8-0.9' -t 6
 flac --totally-silent --lax -0 -b 65535 -o noise.flac noise.wav
 
-# AAC. The encoder uses noise substitution by default, more at low rates.
+# The AAC encoder substitutes noise by default, more of it at low rates.
 convert song.wav low.aac -c:a aac -b:a 128k
 convert song48.wav high.aac -c:a aac -b:a 320k -aac_pns 0
 convert mono.wav mono.aac -c:a aac -b:a 64k
@@ -58,7 +56,7 @@ convert six.wav six.aac -c:a aac -b:a 384k -aac_pns 0
 convert song48.wav loud.aac -c:a aac -b:a 320k -aac_pns 0 -af volume=12dB # exceeds full scale
 convert mono.wav core.aac -c:a aac -b:a 32k -ar 22050
 
-# MP4: the same frames in different layouts of the container
+# These MP4 files hold the same frames in different layouts.
 convert low.aac last.m4a -c:a copy -bsf:a aac_adtstoasc
 convert low.aac first.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart
 convert high.aac high.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart
@@ -70,15 +68,17 @@ convert video.mp4 fragments.mp4 -c copy -movflags +delay_moov+default_base_moof 
 convert mono.mp3 layer3.mp4 -c:a copy
 convert cbr.mp3 stereo3.mp4 -c:a copy
 
-# Ogg
 oggenc --quiet -q 4 -s 1 -t 'A Title' -a 'An Artist' -l 'An Album' -o song.ogg song.wav
 oggenc --quiet -q 2 -s 3 -o mono.ogg mono.wav
 oggenc --quiet -q 2 -s 4 -o six.ogg six.wav
 convert video.avi video.ogv -i song.ogg -map 0:v -map 1:a -c:v libtheora -c:a copy
 
-# One song in each format.
 cd "$out/formats"
-"$make_song" song.wav --seconds 80 --loud-at 31
+# Every fourth hit is much stronger than the others, so that rounding of samples does not change the beats.
+"$make_song" hits.wav --drums 0.08 --bed 0.37 --seconds 80 --loud-at 31 --seed 2
+"$make_song" accents.wav --drums 0.6 --bed 0 --bpm 30 --seconds 80 --loud-at 31 --seed 9
+convert hits.wav song.wav -i accents.wav -filter_complex amix=normalize=0 -c:a pcm_s16le
+rm hits.wav accents.wav
 flac --totally-silent -5 -o song.flac song.wav
 lame --quiet -b 160 -t song.wav constant.mp3
 convert song.wav song.aac -c:a aac -b:a 160k

@@ -84,7 +84,7 @@ void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     }
 }
 
-// Adds a hit that starts at the sample nearest to t. strength: around 1.
+// Adds a hit that starts at the sample nearest to `t` seconds. Its strength is near 1.
 void add_hit(const song_spec &plan, double t, double strength, noise &random,
              std::vector<double> &out) {
     const size_t first = static_cast<size_t>(std::llround(t * plan.rate));

@@ -1,5 +1,5 @@
-// Synthetic songs whose loud section, tempo and drum hits are known, and WAV files of them. Songs
-// of the same plan have the same samples.
+// Makes synthetic songs whose loud section, tempo and drum hits are known, and WAV files of them.
+// The same plan always gives the same samples.
 #ifndef TAVO_TESTS_SUPPORT_SONG_H
 #define TAVO_TESTS_SUPPORT_SONG_H
 
