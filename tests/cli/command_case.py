@@ -70,15 +70,15 @@ class Case(unittest.TestCase):
         """Checks that the folder contains exactly these files, including hidden ones."""
         self.assertEqual({p.name for p in self.folder.iterdir()}, set(names))
 
-    def run_tavo(self, *arguments, status=0, printed=None, said=b"", before=(), **options):
+    def run_tavo(self, *arguments, status=0, printed=None, message=b"", before=(), **options):
         """Runs the command in the folder of the test and checks its exit status. Also checks that `printed` is the
-        standard output and that `said` is a part of the messages. Arguments may be bytes."""
+        standard output and that `message` is a part of the messages. Arguments may be bytes."""
         options = {"input": b"", "cwd": self.folder, "timeout": 250, **options}
         done = subprocess.run([*before, TAVO, *arguments], capture_output=True, **options)
         details = (arguments, done.stdout, done.stderr)
         self.assertEqual(done.returncode, status, details)
         self.assertIn(printed, (None, done.stdout), details)
-        self.assertIn(said, done.stderr, details)
+        self.assertIn(message, done.stderr, details)
         return done
 
     def start(self, *arguments, **options):

@@ -105,8 +105,8 @@ class Ffmpeg(Case):
     def test_clip_that_fails_leaves_nothing(self):
         self.put("a.wav")
         half = self.fake('for last; do :; done; echo half > "${last#file:}"; echo no room >&2; exit 1')
-        self.run_tavo("-l", "2", "--clip", "c.mp3", "a.wav", status=1, said=b"The clip c.mp3 cannot be written. ffmpeg: no room.", **half)
-        self.run_tavo("-l", "2", "--clip", "c.txt", "a.wav", status=1, said=b"output format for 'file:c.txt'")
+        self.run_tavo("-l", "2", "--clip", "c.mp3", "a.wav", status=1, message=b"The clip c.mp3 cannot be written. ffmpeg: no room.", **half)
+        self.run_tavo("-l", "2", "--clip", "c.txt", "a.wav", status=1, message=b"output format for 'file:c.txt'")
         self.assert_only("a.wav", "bin")
 
     def test_ffmpeg_decodes_refused_files(self):
@@ -120,31 +120,31 @@ class Ffmpeg(Case):
             self.assertEqual(result["decoder"], "ffmpeg", result)
             self.assertAlmostEqual(result["duration_ms"], 20000 + late, delta=100, msg=result)
             self.assertAlmostEqual(result["hl_pos_ms"], 8000 + late, delta=400, msg=result)
-        self.run_tavo("24.wav", status=1, said=b"ffmpeg, which may read it, is not installed", env={"PATH": "bin"})
+        self.run_tavo("24.wav", status=1, message=b"ffmpeg, which may read it, is not installed", env={"PATH": "bin"})
 
     def test_a_pipe_is_read_like_a_file(self):
         for path in (SONG, self.encode("a.m4a", ""), self.encode("a.opus", "")):
             (piped,) = self.run_json("/dev/stdin", input=path.read_bytes())
             self.assertEqual(piped, {**self.run_json(path)[0], "file": "/dev/stdin"})
-        self.run_tavo("/dev/stdin", input=b"RIFF", status=1, said=b"Only 4 bytes")
+        self.run_tavo("/dev/stdin", input=b"RIFF", status=1, message=b"Only 4 bytes")
 
     def test_files_cannot_name_other_files(self):
         self.encode("a.ts", "")
         self.assertEqual(self.run_json("a.ts")[0]["decoder"], "ffmpeg")
         for name, content in NAMING_OTHERS.items():
             self.put(name, content)
-            self.run_tavo(name, status=1, said=b"Format not on whitelist")
+            self.run_tavo(name, status=1, message=b"Format not on whitelist")
 
     def test_failing_ffmpeg_fails_only_its_file(self):
         self.put("a.wav")
         self.put("b.mkv", b"no song at all" * 9)
-        for script, said in FAILING.items():
+        for script, message in FAILING.items():
             fake = self.fake(script)
-            if not said:
+            if not message:
                 break
             results = self.run_json("b.mkv", "a.wav", status=1, **fake)
             self.assertEqual([r["status"] for r in results], ["failed", "ok"])
-            self.assertIn(said, results[0]["error"])
+            self.assertIn(message, results[0]["error"])
         idle = self.start("b.mkv", **fake)
         stopped = self.start("-f", "json", "b.mkv", **fake)
         (worker,) = self.wait_until(lambda: children(stopped.pid))

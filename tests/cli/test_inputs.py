@@ -71,7 +71,7 @@ class Inputs(Case):
                 (self.folder / f"none/{depth}").mkdir(parents=True, exist_ok=True)
                 (self.folder / f"none/{depth}/{way}").symlink_to(f"../{depth + 1}")
         for words in ("none", "--recursive none"):
-            self.run_tavo(*words.split(), status=1, said=b"none: The folder holds no audio files")
+            self.run_tavo(*words.split(), status=1, message=b"none: The folder holds no audio files")
 
     def test_lists(self):
         a, b, deep = b"music/a.wav", b"music/b.txt", b"music/inner/deep/d.wav"
@@ -84,13 +84,13 @@ class Inputs(Case):
                 ("music/b.txt --files-from list", b"", [b, a]),
                 ("-", b"\xef\xbb\xbf#EXTM3U\r\n#EXTINF:60,Song\r\nmusic/a.wav\r\n\r\n#1.wav\r\n", [a, b"#1.wav"])):
             self.assertEqual(self.found(*words.split(), input=text), expected, text)
-        for words, text, said in (  # these are not lists
+        for words, text, message in (  # these are not lists
                 ("-", sound, b"sound (WAV), not a list"), ("-0 -", sound, b"sound (WAV)"),
                 ("--files-from music/a.wav", b"", b"name it as FILE"),
                 ("--files-from nowhere", b"", b"list of files cannot be read"),
                 ("-", b"music/a.wav\0music/b.txt", b"give -0"), ("-", b"x" * 70000, b"more than 4096 bytes")):
-            self.run_tavo(*words.split(), input=text, status=1, said=said, printed=b"")
-        self.run_tavo("--format", "json", "-", said=b"names no files", printed=b"")
+            self.run_tavo(*words.split(), input=text, status=1, message=message, printed=b"")
+        self.run_tavo("--format", "json", "-", message=b"names no files", printed=b"")
 
     def test_a_list_is_served_as_it_comes(self):
         """The command prints each result before it reads the next name. Its memory does not grow with the list."""

@@ -39,9 +39,9 @@ def until_next(points, end):
 
 
 def chapters(path):
-    said = subprocess.run(["ffprobe", "-v", "error", "-show_chapters", "-of", "json", path], check=True,
+    output = subprocess.run(["ffprobe", "-v", "error", "-show_chapters", "-of", "json", path], check=True,
                           capture_output=True).stdout
-    return [(float(c["start_time"]), float(c["end_time"]), c["tags"]["title"]) for c in json.loads(said)["chapters"]]
+    return [(float(c["start_time"]), float(c["end_time"]), c["tags"]["title"]) for c in json.loads(output)["chapters"]]
 
 
 class Markers(Case):

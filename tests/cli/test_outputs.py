@@ -33,7 +33,7 @@ class Outputs(Case):
         for arguments, name, content in (*ALL, (["--report", "page.html", "song.wav"], "page.html", b"song.wav")):
             target = self.put(name, b"mine\n")
             names.add(name)
-            self.run_tavo(*arguments, "song.wav", status=1, said=b"--force", printed=b"")
+            self.run_tavo(*arguments, "song.wav", status=1, message=b"--force", printed=b"")
             self.assertEqual(target.read_bytes(), b"mine\n")
             self.run_tavo(*arguments, "--force", "song.wav")
             self.assertIn(content, target.read_bytes())
@@ -49,7 +49,7 @@ class Outputs(Case):
         self.put("kept/file", b"mine\n")
         for link, target, songs in (("page.html", "song.wav", 1), ("page.html", "nowhere", 2), ("page_songs", "kept", 2)):
             (self.folder / link).symlink_to(target)
-            self.run_tavo("--force", "--report", "page.html", *songs * ["song.wav"], status=1, said=link.encode())
+            self.run_tavo("--force", "--report", "page.html", *songs * ["song.wav"], status=1, message=link.encode())
             self.assertEqual((self.folder / link).readlink().name, target)
             (self.folder / link).unlink()
         self.assertEqual(os.listdir(self.folder / "kept"), ["file"])
@@ -74,19 +74,19 @@ class Outputs(Case):
         out.mkdir()
         for _ in range(2):  # y/song.wav is refused even if its analysis ends first
             self.run_tavo(*LABELS, "--force", "-o", "out", "-j", "2", "x", "y", status=1,
-                          said=b"tavo: y/song.wav: Its file out/song.wav.", printed=b"out/song.wav.labels.txt\n")
+                          message=b"tavo: y/song.wav: Its file out/song.wav.", printed=b"out/song.wav.labels.txt\n")
         self.assertEqual(os.listdir(out) + os.listdir(self.folder / "x"), ["song.wav.labels.txt", "song.wav"])
         os.chmod(out, 0o555)
         self.run_tavo(*LABELS, "--force", "-o", "out", "x", status=1, before=AS_ORDINARY_USER,
-                      said=b"cannot be written: permission denied")
+                      message=b"cannot be written: permission denied")
 
     def test_each_file_is_written_once(self):
         self.put("other.wav")
         self.run_tavo(*LABELS, "song.wav", "./song.wav", "other.wav",
-                      said=b"tavo: ./song.wav: named more than once, done once.\n",
+                      message=b"tavo: ./song.wav: named more than once, done once.\n",
                       printed=b"song.wav.labels.txt\nother.wav.labels.txt\n")
         mine = self.put("song.wav.labels.txt", b"mine\n")
-        self.run_tavo(*LABELS, "--skip-existing", "song.wav", "other.wav", ".", said=b"4 inputs left out", printed=b"")
+        self.run_tavo(*LABELS, "--skip-existing", "song.wav", "other.wav", ".", message=b"4 inputs left out", printed=b"")
         self.assertEqual(mine.read_bytes(), b"mine\n")
         # The names of these songs are too long to be part of a marker file's name.
         names = ["\u00e9" * 120 + ending for ending in ("-one.wav", "-two.wav")]

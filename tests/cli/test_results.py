@@ -57,8 +57,8 @@ def clock(ms):
 
 class Results(Case):
     def test_wrong_usage(self):
-        for words, said in USAGE:
-            done = self.run_tavo(*shlex.split(words), status=2, said=said.encode(), printed=b"")
+        for words, message in USAGE:
+            done = self.run_tavo(*shlex.split(words), status=2, message=message.encode(), printed=b"")
             self.assertIn(b"--help", done.stderr)
         self.assert_only()
 
@@ -136,21 +136,21 @@ class Results(Case):
         done = self.run_tavo("--no-ffmpeg", "--max-minutes", "1", "-f", "json", *REFUSED, status=1, before=AS_ORDINARY_USER)
         messages = done.stderr.decode().splitlines()
         results = self.objects(done.stdout)
-        for result, message, (name, (_, said)) in zip(results, messages, REFUSED.items(), strict=True):
+        for result, line, (name, (_, message)) in zip(results, messages, REFUSED.items(), strict=True):
             self.assertEqual((result["file"], result["status"], "beats_ms" in result), (name, "failed", False))
-            self.assertIn(said, result["error"])
+            self.assertIn(message, result["error"])
             self.assertRegex(result["error"], r"^[A-Z].*\.$")
-            self.assertEqual(message, f"tavo: {name}: {result['error']}")
+            self.assertEqual(line, f"tavo: {name}: {result['error']}")
 
     def test_notes(self):
         self.put("song.wav")
-        for words, said in (("--length 10 --mode beats", b"--length has no effect in mode beats"),
+        for words, message in (("--length 10 --mode beats", b"--length has no effect in mode beats"),
                             ("--max-beats 9 --mode highlight", b"--max-beats has no effect in mode highlight"),
                             ("--click c.wav --force", b"the click track starts at the highlight")):
-            self.run_tavo(*words.split(), "song.wav", said=said)
+            self.run_tavo(*words.split(), "song.wav", message=message)
             self.assertEqual(self.run_tavo(*words.split(), "-q", "song.wav").stderr, b"")
-        for words, said in (("--help >/dev/full", b"No space left"), ("song.wav >/dev/full", b"cannot be written"),
+        for words, message in (("--help >/dev/full", b"No space left"), ("song.wav >/dev/full", b"cannot be written"),
                             ("song.wav <&- >&-", b"cannot be written")):
             done = subprocess.run(f"'{TAVO}' {words}", shell=True, cwd=self.folder, capture_output=True)
             self.assertEqual(done.returncode, 1, words)
-            self.assertIn(said, done.stderr)
+            self.assertIn(message, done.stderr)

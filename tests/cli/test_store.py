@@ -33,7 +33,7 @@ class Store(Case):
         self.put("text.wav", content=b"no music, but as long as a head\n" * 4)
         words = ["--length", "5", "a.wav", odd, "text.wav"]
         results = self.run_json(*words, status=1)
-        self.run_tavo(*STORE, *words, status=1, said=b"3 stored", printed=b"")
+        self.run_tavo(*STORE, *words, status=1, message=b"3 stored", printed=b"")
         rows = self.rows()
         self.assertEqual(sorted(rows), [b"a.wav", os.fsencode(odd), b"text.wav"])
         for name, result in zip(words[2:], results, strict=True):
@@ -43,7 +43,7 @@ class Store(Case):
                              [state.st_size, state.st_mtime_ns, "both", 5, 0])
         # A second run knows all songs, including the failed one.
         self.run_tavo("--store", "sqlite:x.db", "--format", "json", *words, status=1,
-                      said=b"0 stored, 3 known already (1 failed; --retry-failed)", printed=b"")
+                      message=b"0 stored, 3 known already (1 failed; --retry-failed)", printed=b"")
 
     def test_changed_requests_and_files_are_analysed_again(self):
         self.put("a.wav")
@@ -53,7 +53,7 @@ class Store(Case):
             if words == "touched":
                 os.utime(self.folder / "a.wav", (1, 1))
                 words = ""
-            self.run_tavo(*STORE, *words.split(), "a.wav", "bad.wav", status=status, said=b"%d stored" % stored)
+            self.run_tavo(*STORE, *words.split(), "a.wav", "bad.wav", status=status, message=b"%d stored" % stored)
         rows = self.rows("WHERE mode = 'both' AND max_beats = 0")
         self.assertEqual((len(rows), rows[b"a.wav"]["mtime_ns"]), (2, 10**9))
 
@@ -83,7 +83,7 @@ class Store(Case):
         self.run_tavo(*STORE, "a.wav")
         with sqlite3.connect(self.folder / "x.db", isolation_level=None) as other:
             other.execute("BEGIN EXCLUSIVE")
-            done = self.run_tavo(*STORE, "--redo", "--patience", "3", "a.wav", status=1, said=b"trying again")
+            done = self.run_tavo(*STORE, "--redo", "--patience", "3", "a.wav", status=1, message=b"trying again")
             other.execute("ROLLBACK")
         self.assertIn(b"1 result could not be stored", done.stderr)
         (saved,) = self.objects(done.stdout)
@@ -93,7 +93,7 @@ class Store(Case):
                            ("sqlite::memory:", b"is not a file"), ("text.db", b"not a database"),
                            ("postgresql://127.0.0.1:9/x", b"Connection refused"),
                            ("postgresql://me:se%40c/r@et@127.0.0.1:9/x", b"cannot be used")):
-            done = self.run_tavo("--store", url, "a.wav", status=1, said=words)
+            done = self.run_tavo("--store", url, "a.wav", status=1, message=words)
             self.assertNotRegex(done.stderr, rb"\bme\b|\bse\b|\bc\b|\br\b|\bet\b|trying again")
 
     def test_from_store(self):
@@ -107,7 +107,7 @@ class Store(Case):
         start, end = (expected[1][key] / 1000 for key in ("hl_pos_ms", "hl_end_ms"))
         self.assertIn(f"{start:.6f}\t{end:.6f}\thighlight", (self.folder / "song 1.wav.labels.txt").read_text())
         self.run_tavo(*STORE, "--from-store", status=2)
-        self.run_tavo("--store", "", "--format", "json", names[0], status=2, said=b"--store", printed=b"")
+        self.run_tavo("--store", "", "--format", "json", names[0], status=2, message=b"--store", printed=b"")
         # Reading does not need write access to the store and its folder.
         for path in self.folder.glob("x.db-*"):
             path.unlink()
@@ -125,9 +125,9 @@ class Store(Case):
             path.unlink()
         self.put("song 1.wav.labels.txt", b"of somebody else\n")
         for stored, known in ((2, 0), (0, 2)):  # the failure of song 1 is not stored
-            self.run_tavo(*words, status=1, said=b"song 1.wav: The file song 1.wav.labels.txt exists already")
+            self.run_tavo(*words, status=1, message=b"song 1.wav: The file song 1.wav.labels.txt exists already")
             self.assertEqual([row["status"] for row in self.rows().values()], ["ok"] * 2)
-        self.run_tavo(*words, "--force", said=b"1 stored, 2 known")
+        self.run_tavo(*words, "--force", message=b"1 stored, 2 known")
 
     def test_a_store_of_the_first_version(self):
         """An older store has no columns offset_ms and decoder. Here some rows are damaged, too."""
@@ -152,11 +152,11 @@ class Store(Case):
         self.assertEqual(self.objects(done.stdout)[0]["beats_ms"], expected["beats_ms"])
         sentence = self.rows()[b"bad.wav"]["sentence"]
         self.run_tavo(*STORE, "--from-store", "--failed", printed=f"bad.wav: {sentence}\n".encode())
-        self.run_tavo(*STORE, "a.wav", said=b"1 known")  # upgrades the table
+        self.run_tavo(*STORE, "a.wav", message=b"1 known")  # upgrades the table
         with sqlite3.connect(self.folder / "x.db") as db:
             self.assertEqual(db.execute("SELECT count(offset_ms), count(decoder) FROM songs").fetchone(), (0, 0))
             db.execute("PRAGMA user_version = 99")
-        self.run_tavo(*STORE, "a.wav", status=1, said=b"written by a newer tavo")
+        self.run_tavo(*STORE, "a.wav", status=1, message=b"written by a newer tavo")
 
     def test_shards(self):
         names = self.put_songs(12)
