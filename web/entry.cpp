@@ -1,6 +1,7 @@
 // Functions that the page's worker calls. Strings are UTF-8; the caller frees returned strings.
 #include <cstdint>
 #include <cstring>
+#include <nlohmann/json.hpp>
 #include <string>
 
 #include "cli/report/song_view.h"

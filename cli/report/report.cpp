@@ -7,6 +7,7 @@
 #include <cmath>
 #include <cstdint>
 #include <filesystem>
+#include <nlohmann/json.hpp>
 
 #include "cli/input/recognise.h"
 #include "cli/report/song_view.h"

@@ -5,6 +5,7 @@
 #include <climits>
 #include <cmath>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <numeric>
 
 #include "cli/system.h"

@@ -10,7 +10,6 @@
 #include <exception>
 #include <fstream>
 #include <iterator>
-#include <nlohmann/json.hpp>
 
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
@@ -35,7 +34,7 @@ record read_stored(const request &message, const options &opts, int stop_fd, son
     record out;
     try {
         out = record_from_json(message.stored);
-    } catch (const nlohmann::json::exception &) {
+    } catch (const std::exception &) {
         out.mode = opts.mode;
         out.error = "Its row in the store is damaged.";
     }

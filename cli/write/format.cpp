@@ -6,6 +6,7 @@
 #include <array>
 #include <charconv>
 #include <cmath>
+#include <nlohmann/json.hpp>
 #include <utility>
 #include <vector>
 

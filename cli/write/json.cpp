@@ -1,6 +1,7 @@
 #include "cli/write/json.h"
 
 #include <cmath>
+#include <nlohmann/json.hpp>
 
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"

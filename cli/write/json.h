@@ -3,7 +3,7 @@
 #define TAVO_CLI_WRITE_JSON_H
 
 #include <cstdint>
-#include <nlohmann/json.hpp>
+#include <nlohmann/json_fwd.hpp>
 #include <string>
 #include <vector>
 
