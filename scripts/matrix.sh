@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # scripts/matrix.sh [NAME]...
-# Builds the library with every compiler, optimisation level and sanitizer below (or with those named) and compares
-# its results with the golden ones, to the last digit of milliseconds and BPM. Fails if any differs.
+# Builds the library with every compiler, optimisation level and sanitizer listed below, or only those with the given
+# NAMEs. Compares the results with the golden ones, exactly in milliseconds and BPM. Fails if any differs.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 

@@ -42,7 +42,7 @@ for group in "${@:-build java tests web fuzz}"; do
       fuzz) wanted+=("${fuzz[@]}") ;;
       measure) wanted+=("${measure[@]}") ;;
       package) wanted+=("${package[@]}") ;;
-      *) echo "setup: no group '$name'; groups: build, java, tests, web, cluster, fuzz, measure, package" >&2; exit 2 ;;
+      *) echo "setup: unknown group '$name'; groups: build, java, tests, web, cluster, fuzz, measure, package" >&2; exit 2 ;;
     esac
   done
 done
@@ -69,7 +69,7 @@ echo "setup: installing ${missing[*]}" >&2
 log=$(mktemp)
 trap 'rm -f "$log"' EXIT
 export DEBIAN_FRONTEND=noninteractive
-progress() { # of apt-get: every step on a terminal, every 50th elsewhere
+progress() { # prints the progress of apt-get: every step on a terminal, every 50th step elsewhere
   local every=50
   [[ -t 2 ]] && every=1
   awk -v every=$every '

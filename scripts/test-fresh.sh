@@ -6,7 +6,7 @@
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $(id -u) -ne 0 ]]; then
-  echo "test-fresh: only root can make a system of its own" >&2
+  echo "test-fresh: run it as root" >&2
   exit 1
 fi
 [[ $# -gt 0 ]] || set -- "bash scripts/demo.sh" "bash scripts/test.sh"
@@ -17,7 +17,7 @@ log=$root.log
 remove_root() {
   if mountpoint -q "$root/proc"; then umount "$root/proc" || true; fi
   if grep -qF " $root/" /proc/self/mountinfo; then
-    echo "test-fresh: something is still mounted below $root, which therefore stays" >&2
+    echo "test-fresh: something is still mounted below $root; $root is not deleted" >&2
   else
     rm -rf --one-file-system "$root" "$log"
   fi
@@ -50,5 +50,5 @@ for command in "$@"; do
   SECONDS=0
   env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin HOME=/root \
     chroot "$root" sh -c "cd /root/tavo && $command"
-  echo "== $command: well, $SECONDS s"
+  echo "== $command: passed in $SECONDS s"
 done

@@ -7,7 +7,7 @@
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $(id -u) -ne 0 ]]; then
-  echo "test-package: only root can make a system to install into" >&2
+  echo "test-package: run it as root" >&2
   exit 1
 fi
 bash scripts/setup.sh build java tests package
@@ -40,7 +40,7 @@ quietly() {
 }
 echo "== a clean system"
 quietly debootstrap --variant=minbase bookworm "$root"
-mount -t proc proc "$root/proc" # the loader finds the path of a program there
+mount -t proc proc "$root/proc" # programs find their own path there
 inside() {
   env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin LC_ALL=C.UTF-8 DEBIAN_FRONTEND=noninteractive \
     chroot "$root" "$@"
@@ -49,7 +49,7 @@ fail() {
   echo "test-package: $*" >&2
   exit 1
 }
-traces() { # files that a removal must delete
+traces() { # lists the files that a purge must delete
   inside find / -xdev -path /proc -prune -o -name '*tavo*' ! -path '/try/*' -print
 }
 
@@ -61,16 +61,16 @@ cp "${tar[0]}" "$root/try/tavo.tar.gz"
 # Creates a song with two hits per second, loud from 15 s on.
 ffmpeg -v error -f lavfi -i \
   'aevalsrc=sin(2*PI*220*t)*(0.1+0.6*gt(t\,15))*exp(-8*mod(t\,0.5)):d=40:s=44100' "$root/try/song.flac"
-without_time() { # the result without the processor time, which differs
+without_time() { # removes the processor time, which differs between runs
   sed -E 's/,?"[a-z_]*cpu[a-z_]*":[0-9.]+//'
 }
 expected=$(cd "$root/try" && "$tree/bin/tavo" --format json --length 20 song.flac | without_time)
-[[ $expected == *'"status":"ok"'* ]] || fail "the build gives $expected"
-same() { # same COMMAND: its result is the build's
+[[ $expected == *'"status":"ok"'* ]] || fail "the build prints $expected"
+same() { # same COMMAND: fails unless COMMAND prints the same result as the build
   local got
   got=$(inside sh -c "cd /try && $1 --format json --length 20 song.flac" | without_time)
-  [[ $got == "$expected" ]] || fail "$1 gives $got instead of $expected"
-  echo "$1: the build's result"
+  [[ $got == "$expected" ]] || fail "$1 prints $got instead of $expected"
+  echo "$1: same result as the build"
 }
 
 echo "== the Debian packages"
@@ -86,8 +86,8 @@ for file in /usr/share/man/man1/tavo.1.gz /usr/share/bash-completion/completions
   [[ -s $root$file ]] || fail "$file is missing"
 done
 cache=$(inside ldconfig -p)
-[[ $cache == *libtavo.so.1* ]] || fail "the loader does not know libtavo.so.1"
-[[ $cache != *liblog.so* && $cache != *libwexaaudio* ]] || fail "a private library is everybody's"
+[[ $cache == *libtavo.so.1* ]] || fail "the loader does not find libtavo.so.1"
+[[ $cache != *liblog.so* && $cache != *libwexaaudio* ]] || fail "the loader finds a private library"
 
 quietly inside apt-get install -y --no-install-recommends gcc libc6-dev pkg-config
 # shellcheck disable=SC2016 # for the shell inside
@@ -99,11 +99,11 @@ highlight=${highlight%%,*}
 grep -qx "highlight $highlight" <<<"$lines" || fail "the example prints $lines"
 echo "analyze_file: highlight $highlight, $(grep -c '^beat ' <<<"$lines") beats"
 
-[[ -n $(traces) ]] || fail "a removal would not be seen"
+[[ -n $(traces) ]] || fail "no installed file has tavo in its name, so the purge cannot be checked"
 quietly inside apt-get purge -y libtavo1 tavo-doc
 left=$(traces)
-[[ -z $left ]] || fail "left behind: $left"
-echo "purged: nothing left"
+[[ -z $left ]] || fail "not purged: $left"
+echo "purged: no file is left"
 
 echo "== the .tar.gz"
 inside mkdir /try/anywhere
@@ -115,7 +115,7 @@ python=/usr/bin/python3
 "$python" -m venv --system-site-packages "$build/venv" # NumPy is Debian's
 "$build/venv/bin/pip" install --quiet --no-index "$build"/wheel/tavo-*-py3-none-linux_*.whl
 got=$(cd "$root/try" && "$build/venv/bin/tavo" --format json --length 20 song.flac | without_time)
-[[ $got == "$expected" ]] || fail "the wheel gives $got instead of $expected"
+[[ $got == "$expected" ]] || fail "the wheel prints $got instead of $expected"
 (cd / && "$build/venv/bin/python" -c 'import sys, tavo; print(tavo.__file__, tavo.analyze(sys.argv[1]).highlight_ms)' \
   "$root/try/song.flac")
-echo "test-package: all well"
+echo "test-package: passed"
