@@ -20,7 +20,8 @@ echo "== clang-tidy"
 bash scripts/tidy.sh || failed+=("clang-tidy")
 for preset in release asan tsan; do
   echo "== $preset: tests"
-  ctest --preset "$preset" --parallel "$(nproc)" ||
+  # one more than there are processors, because some tests wait for a browser or a timer
+  ctest --preset "$preset" --parallel $(($(nproc) + 1)) ||
     failed+=("$preset: $(cut -d: -f2- "build/$preset/Testing/Temporary/LastTestsFailed.log" | paste -sd ' ')")
 done
 if [[ ${#failed[@]} -gt 0 ]]; then
