@@ -36,7 +36,7 @@ struct options {
     std::string report;                      // path of the page, or empty
     bool embed = false;                      // the page contains the sound
     std::string output_dir;                  // of marker files; empty: beside each input
-    std::string fps = "30";                  // for formats that count frames, see frame_rate.h
+    std::string fps = "30";                  // for formats that count frames, see markers.h
     bool force = false;
     bool skip_existing = false;
     bool quiet = false;

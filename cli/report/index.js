@@ -1,9 +1,9 @@
-// Sorts the songs by a column and filters them by name.
+// The index of songs: sorts them by a column and filters them by name.
 const body = document.querySelector("#songs tbody");
 const heads = [...document.querySelectorAll("#songs thead th")];
 
-// Sorts the first column by text and the others by data-value. Songs without a data-value come
-// last.
+// Compares rows by the text of the first column, or by the data-value of another one. Rows without
+// a data-value come last.
 function compare(column, sign) {
   return (a, b) => {
     const [x, y] = [a.cells[column], b.cells[column]];

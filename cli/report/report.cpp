@@ -14,8 +14,8 @@
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
-// Parts of the pages, from report_pages.cpp, which the build generates from the sources in this
-// folder. The song's title and its data, and the rows of the index, belong between them.
+// Parts of the pages, generated from this folder by pages.cmake. The title and the data of a song,
+// or the rows of the index, are inserted between them.
 extern const char *const kSongPage[3];
 extern const char *const kIndexPage[2];
 
@@ -27,20 +27,18 @@ std::string base64(const std::string &bytes) {
     constexpr const char *kDigits =
         "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
     std::string out;
-    out.reserve((bytes.size() + 2) / 3 * 4);
-    for (size_t i = 0; i < bytes.size(); i += 3) {
-        uint32_t group = 0;
-        for (size_t k = 0; k < 3; ++k) {
-            group = group << 8 | (i + k < bytes.size() ? static_cast<uint8_t>(bytes[i + k]) : 0U);
-        }
-        for (size_t k = 0; k < 4; ++k) {
-            out += i + k <= bytes.size() ? kDigits[group >> (18 - 6 * k) & 63] : '=';
-        }
+    uint32_t group = 0;  // its last `bits` bits are not written yet
+    int bits = 0;
+    for (const char byte : bytes) {
+        group = group << 8 | static_cast<uint8_t>(byte);
+        for (bits += 8; bits >= 6; bits -= 6) out += kDigits[group >> (bits - 6) & 63];
     }
+    if (bits > 0) out += kDigits[group << (6 - bits) & 63];
+    out.resize((bytes.size() + 2) / 3 * 4, '=');
     return out;
 }
 
-// Adds the sound to the page at page_path: the bytes of the file, or its relative URL.
+// Adds the sound to the view: the bytes of the file, or its URL relative to the page.
 failure add_sound(const std::string &song_path, const std::string &page_path, bool embed,
                   result_json &view) {
     if (embed) {
@@ -85,7 +83,7 @@ std::string miniature(const std::vector<float> &loudness) {
            "role=\"img\" aria-label=\"Loudness\"><path class=\"loud\" d=\"" + path + "\"/></svg>";
 }
 
-// page: relative to the index.
+// Returns the row of a song. The path of its page is relative to the index.
 std::string index_row(const record &result, const result_json &view, const std::string &page) {
     const auto duration = static_cast<double>(result.duration_ms);
     const auto beats = static_cast<double>(result.beats_ms.size());
@@ -99,7 +97,7 @@ std::string index_row(const record &result, const result_json &view, const std::
            miniature(view["loudness"]) + "</td></tr>\n";
 }
 
-// Path of the folder of the songs' pages, beside the index.
+// Returns the path of the folder of the songs' pages, which is beside the index.
 std::string pages_folder(const options &opts) {
     return fs::path(opts.report).replace_extension().string() + "_songs";
 }

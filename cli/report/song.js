@@ -1,4 +1,4 @@
-// Draws one song's result on one time axis, in ms of the player's time, and plays the song.
+// Draws a song's result on a time axis, in ms of the player's time, and plays the song.
 const song = JSON.parse(document.getElementById("data").textContent);
 const beats = song.beats_ms || [];
 const hasHighlight = song.hl_pos_ms !== undefined;
@@ -18,7 +18,7 @@ function line(kind, x, top, bottom) {
   return shape("line", { class: kind, x1: x, x2: x, y1: top, y2: bottom });
 }
 
-// ---- Picture: x is time in ms, y a percentage of the height. Zooming changes the view box only.
+// ---- The picture. x is a time in ms, y a percentage of the height. Zooming only changes the view box.
 
 function drawWave() {
   const count = song.wave.length / 2;
@@ -36,7 +36,7 @@ function drawLoudness() {
   byId("loudname").hidden = song.loudness.length === 0;
   const top = Math.max(...song.loudness, song.mean, 1e-9);
   const y = (value) => (79 - value / top * 29).toFixed(2);
-  // Each value is drawn in the middle of its window of 6 s.
+  // A value is drawn in the middle of its window of 6 s.
   const points = song.loudness.map((value, k) => `${song.sound_ms + 2000 * k + 3000} ${y(value)}`);
   if (points.length === 0) return;
   shape("path", { class: "loud", d: "M" + points.join("L") });
@@ -44,24 +44,22 @@ function drawLoudness() {
 }
 
 function box(kind, from, to) {
-  shape("rect", { class: kind, x: from, y: 0, width: Math.max(0, to - from), height: 100 });
+  const end = Math.max(from, to);
+  shape("path", { class: kind, d: `M${from} 0L${end} 0L${end} 100L${from} 100Z` });
 }
 
-function draw() {
-  if (song.searched_ms) {
-    box("unsearched", 0, song.searched_ms[0]);
-    box("unsearched", song.searched_ms[1], song.length_ms);
-  }
-  byId("unsearched").hidden = !song.searched_ms;
-  if (hasHighlight) box("region", song.hl_pos_ms, loopEnd);
-  drawWave();
-  drawLoudness();
-  byId("beatname").hidden = beats.length === 0;
-  for (const beat of beats) line("beat", beat, 83, 98);
-  if (hasHighlight) line("start", song.hl_pos_ms, 0, 100);
+if (song.searched_ms) {
+  box("unsearched", 0, song.searched_ms[0]);
+  box("unsearched", song.searched_ms[1], song.length_ms);
 }
-
-const playhead = (draw(), line("head", 0, 0, 100));
+byId("unsearched").hidden = !song.searched_ms;
+if (hasHighlight) box("region", song.hl_pos_ms, loopEnd);
+drawWave();
+drawLoudness();
+byId("beatname").hidden = beats.length === 0;
+for (const beat of beats) line("beat", beat, 83, 98);
+if (hasHighlight) line("start", song.hl_pos_ms, 0, 100);
+const playhead = line("head", 0, 0, 100);
 
 function drawTicks() {
   const steps = [100, 200, 500, 1e3, 2e3, 5e3, 1e4, 15e3, 3e4, 6e4, 12e4, 3e5, 6e5, 9e5, 18e5, 36e5, 72e5];
@@ -78,15 +76,14 @@ function drawTicks() {
   byId("times").replaceChildren(...ticks);
 }
 
-// ---- Exports the picture as a file: the visible part, with sizes in pixels and colours as
-// attributes, so that every program draws it the same way.
+// ---- The picture as a file. It shows the visible part. Sizes are in pixels and colours are
+// attributes, so that every program draws the picture in the same way.
 
 function pictureSvg() {
   const width = 1200, height = 360, top = 34, bottom = 330;
   const ink = getComputedStyle(document.body);
   const x = (ms) => (width * (ms - view.from) / (view.to - view.from)).toFixed(1);
   const y = (percent) => (top + (bottom - top) * percent / 100).toFixed(1);
-  const span = (from, to, scale) => Math.abs(scale(from) - scale(to)).toFixed(1);
   const root = shape("svg", { xmlns: svg.namespaceURI, width, height, viewBox: `0 0 ${width} ${height}`,
     "font-family": "sans-serif", "font-size": 14, fill: ink.color }, null);
   const text = (words, left, base, anchor) => {
@@ -103,10 +100,8 @@ function pictureSvg() {
     if (part === playhead) continue;
     if (part.tagName === "path") {
       look.d = part.getAttribute("d").replace(/(-?[\d.]+) (-?[\d.]+)/g, (_, ms, percent) => `${x(ms)} ${y(percent)}`);
-    } else if (part.tagName === "line") {
-      Object.assign(look, { x1: x(at("x1")), x2: x(at("x2")), y1: y(at("y1")), y2: y(at("y2")) });
     } else {
-      Object.assign(look, { x: x(at("x")), y: y(at("y")), width: span(at("x") + at("width"), at("x"), x), height: span(100, 0, y) });
+      Object.assign(look, { x1: x(at("x1")), x2: x(at("x2")), y1: y(at("y1")), y2: y(at("y2")) });
     }
     shape(part.tagName, look, root);
   }
@@ -137,10 +132,10 @@ function zoomToBeat() {
   show(nearest - 1000, nearest + 1000);
 }
 
-// ---- Sound. A linked file plays in an audio element: a page from disk cannot route it through an
-// audio context, so the clicks have a context of their own. An embedded file is decoded and plays
-// in the clicks' context, so that both share one clock. Either way the browser drops the encoder
-// delay that the file states; the page's times already account for it.
+// ---- Sound. A linked file plays in an audio element. A page from disk cannot route it through an
+// audio context, so the clicks have their own context. An embedded file is decoded and plays in the
+// context of the clicks, so that both share one clock. Browsers drop the encoder delay that the
+// file states, and the page's times do not include it.
 
 let context = null;
 function wake() {
@@ -194,8 +189,8 @@ const embedded = {
 const player = song.embedded ? embedded : linked;
 if (!song.embedded) audio.src = song.audio;
 
-let scheduled = [];  // click nodes that may not have ended
-let clickedTo = 0;   // beats before this one have their click
+let scheduled = [];  // click nodes that may still sound
+let clickedTo = 0;   // clicks of the beats before this time are scheduled
 
 function dropClicks() {
   for (const node of scheduled) node.stop();
@@ -309,13 +304,13 @@ for (const id in actions) byId(id).addEventListener("click", actions[id]);
 
 document.addEventListener("keydown", (event) => {
   if (event.ctrlKey || event.metaKey || event.altKey) return;
-  const onButton = event.target.closest("button") !== null;
-  if (onButton && (event.key === " " || event.key === "Enter")) return;
+  if (event.target.closest("button") && (event.key === " " || event.key === "Enter")) return;
   const moves = { ArrowLeft: -5000, ArrowRight: 5000, PageDown: -30000, PageUp: 30000 };
+  const action = keys[event.key.toLowerCase()];
   if (event.key in moves && (event.target === timeline || event.key.startsWith("Arrow"))) seek(player.now() + moves[event.key]);
   else if (event.target === timeline && event.key === "Home") seek(0);
   else if (event.target === timeline && event.key === "End") seek(song.length_ms);
-  else if (keys[event.key.toLowerCase()] && !byId(keys[event.key.toLowerCase()]).disabled) actions[keys[event.key.toLowerCase()]]();
+  else if (action && !byId(action).disabled) actions[action]();
   else return;
   event.preventDefault();
 });

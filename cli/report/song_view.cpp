@@ -30,27 +30,22 @@ struct extent {
 };
 
 struct sound {
+    int64_t samples_per_hop = 0;
     int64_t samples = 0;
     std::vector<extent> bins;  // equally long
     int64_t samples_per_bin = 1;
-    extent bin;  // incomplete
-    int64_t bin_samples = 0;
-    std::vector<double> hops;  // sums of the squares of complete hops
-    double hop = 0.0;          // of the incomplete hop
-    int64_t hop_samples = 0;
+    int64_t bin_rest = 0;      // samples that the last bin still lacks
+    std::vector<double> hops;  // sums of the squares of the samples
+    int64_t hop_rest = 0;      // samples that the last hop still lacks
 };
 
 extent merged(const extent &a, const extent &b) {
     return {std::min(a.low, b.low), std::max(a.high, b.high)};
 }
 
-// Doubles the length of the bins when there are too many. Their number is not known in advance,
-// because the duration stated by a file may be wrong.
-void close_bin(sound &song) {
-    song.bins.push_back(song.bin);
-    song.bin = {};
-    song.bin_samples = 0;
-    if (song.bins.size() < kMostBins) return;
+// Merges pairs of bins. The number of bins is not known in advance, because the duration stated by
+// a file may be wrong.
+void halve_bins(sound &song) {
     for (size_t i = 0; i < kMostBins / 2; ++i) {
         song.bins[i] = merged(song.bins[2 * i], song.bins[2 * i + 1]);
     }
@@ -58,20 +53,24 @@ void close_bin(sound &song) {
     song.samples_per_bin *= 2;
 }
 
-void add_sample(sound &song, int16_t sample, int64_t samples_per_hop) {
-    const double level = sample / 32767.0;
-    ++song.samples;
-    song.bin = merged(song.bin, {sample, sample});
-    if (++song.bin_samples == song.samples_per_bin) close_bin(song);
-    song.hop += level * level;
-    if (++song.hop_samples == samples_per_hop) {
-        song.hops.push_back(song.hop);
-        song.hop = 0.0;
-        song.hop_samples = 0;
+void add_sample(sound &song, int16_t sample) {
+    if (song.bin_rest == 0) {
+        song.bins.emplace_back();
+        song.bin_rest = song.samples_per_bin;
     }
+    if (song.hop_rest == 0) {
+        song.hops.push_back(0.0);
+        song.hop_rest = song.samples_per_hop;
+    }
+    const double level = sample / 32767.0;
+    song.bins.back() = merged(song.bins.back(), {sample, sample});
+    song.hops.back() += level * level;
+    ++song.samples;
+    --song.hop_rest;
+    if (--song.bin_rest == 0 && song.bins.size() == kMostBins) halve_bins(song);
 }
 
-failure read_samples(const std::string &path, int64_t samples_per_hop, int stop_fd, sound &song) {
+failure read_samples(const std::string &path, int stop_fd, sound &song) {
     const mtsrc_param param{path.c_str()};
     int32_t code = 0;
     const std::unique_ptr<mtsrc_ctx, decltype(&mtsrc_deinit)> source(mtsrc_init(&param, &code),
@@ -83,49 +82,42 @@ failure read_samples(const std::string &path, int64_t samples_per_hop, int stop_
         code = mtsrc_getstream(source.get(), static_cast<int32_t>(sizeof block), &frame);
         if (code < 0) break;
         for (size_t i = 0; i < static_cast<size_t>(frame.size) / sizeof block[0]; ++i) {
-            add_sample(song, block[i], samples_per_hop);
+            add_sample(song, block[i]);
         }
     }
-    if (song.bin_samples > 0) song.bins.push_back(song.bin);
-    return song.samples > 0 ? failure()
-                            : failure{"The sound could not be read again for the page."};
+    if (song.samples == 0) return {"The sound could not be read again for the page."};
+    if (song.hop_rest > 0) song.hops.pop_back();  // incomplete
+    return {};
 }
 
-// Converts the bins to columns of a time axis. A column covers every bin that it overlaps. No
-// column is after the last sample.
-std::vector<extent> columns_of(const sound &song, double axis_samples) {
+// Returns the lowest and the highest sample of each column of a time axis, from -127 to 127 at the
+// peak. A column covers every bin that it overlaps. The last column is that of the last sample.
+result_json wave_of(const sound &song, double axis_samples) {
+    int peak = 1;
+    for (const extent &bin : song.bins) peak = std::max({peak, -bin.low, +bin.high});
     const double bins_per_column =
         axis_samples / kColumns / static_cast<double>(song.samples_per_bin);
-    std::vector<extent> columns;
+    result_json wave = result_json::array();
     for (size_t k = 0; k < kColumns; ++k) {
         const auto first = static_cast<size_t>(static_cast<double>(k) * bins_per_column);
-        if (first >= song.bins.size()) break;
         const auto end =
             static_cast<size_t>(std::ceil(static_cast<double>(k + 1) * bins_per_column));
+        if (first >= song.bins.size()) break;
         extent column = song.bins[first];
         for (size_t i = first + 1; i < std::min(end, song.bins.size()); ++i) {
             column = merged(column, song.bins[i]);
         }
-        columns.push_back(column);
-    }
-    return columns;
-}
-
-result_json wave_of(const std::vector<extent> &columns) {
-    int peak = 1;
-    for (const extent &column : columns) peak = std::max({peak, -column.low, +column.high});
-    result_json wave = result_json::array();
-    for (const extent &column : columns) {
         wave.push_back(std::lround(column.low * (127.0 / peak)));
         wave.push_back(std::lround(column.high * (127.0 / peak)));
     }
     return wave;
 }
 
-// Uses the formula of tavo_get_loudness. A window consists of whole hops.
-std::vector<float> loudness_of(const sound &song, int64_t samples_per_hop) {
+// Returns the loudness curve, computed with the formula of tavo_get_loudness. A window consists of
+// whole hops.
+std::vector<float> loudness_of(const sound &song) {
     std::vector<float> values;
-    const auto samples = static_cast<double>(samples_per_hop) * kWindowHops;
+    const double samples = static_cast<double>(song.samples_per_hop) * kWindowHops;
     for (size_t i = 0; i + kWindowHops <= song.hops.size(); ++i) {
         const auto *first = song.hops.data() + i;
         const double sum = std::accumulate(first, first + kWindowHops, 0.0);
@@ -134,15 +126,15 @@ std::vector<float> loudness_of(const sound &song, int64_t samples_per_hop) {
     return values;
 }
 
-// Returns start and end, in ms, of the part of the song in which a highlight can be found.
-// loudness: number of values.
-result_json searched_span(const record &result, size_t loudness) {
+// Returns the start and the end, in ms, of the part of the song in which a highlight can be found,
+// given the number of loudness values.
+result_json searched_span(const record &result, size_t count) {
     const bool is_short = result.duration_ms / 1000 < TAVO_SHORT_SONG_S;
     const int skip = is_short ? 0 : TAVO_SEARCH_SKIP;
     const int tail = is_short ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
     const double start = skip * kHopMs;
     // The last window that is searched may have its rise at its end.
-    const double last = static_cast<double>(loudness) - tail;
+    const double last = static_cast<double>(count) - tail;
     const double end = last < 0.0 ? start : last * kHopMs + kWindowMs;
     return {player_ms(result, start), player_ms(result, std::max(start, end))};
 }
@@ -169,18 +161,16 @@ void add_result(const record &result, result_json &view) {
 
 failure read_song_view(const record &result, int stop_fd, result_json &view) {
     const int32_t rate = result.sample_rate;
-    const int64_t samples_per_hop = int64_t{rate} * TAVO_LOUDNESS_HOP_MS / 1000;
     sound song;
-    if (failure failed = read_samples(result.sound_path, samples_per_hop, stop_fd, song)) {
-        return failed;
-    }
+    song.samples_per_hop = int64_t{rate} * TAVO_LOUDNESS_HOP_MS / 1000;
+    if (failure failed = read_samples(result.sound_path, stop_fd, song)) return failed;
 
     const double read_ms = 1000.0 * static_cast<double>(song.samples) / rate;
     double length_ms = std::max(read_ms, static_cast<double>(result.hl_pos_ms));
     for (const float beat : result.beats_ms) {
         length_ms = std::max(length_ms, static_cast<double>(beat));
     }
-    const std::vector<float> loudness = loudness_of(song, samples_per_hop);
+    const std::vector<float> loudness = loudness_of(song);
     const double sum = std::accumulate(loudness.begin(), loudness.end(), 0.0);
     view = {{"name", as_utf8(base_name(result.file))},
             {"mode", mode_word(result.mode)},
@@ -190,7 +180,7 @@ failure read_song_view(const record &result, int stop_fd, result_json &view) {
             {"length_ms", player_ms(result, length_ms)},
             {"sound_ms", -result.offset_ms},
             {"read_ms", read_ms},
-            {"wave", wave_of(columns_of(song, length_ms * rate / 1000.0))},
+            {"wave", wave_of(song, length_ms * rate / 1000.0)},
             {"loudness", loudness},
             {"mean", loudness.empty() ? 0.0 : sum / static_cast<double>(loudness.size())}};
     add_result(result, view);

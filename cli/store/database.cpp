@@ -16,14 +16,6 @@ const database_kind *postgresql_database() {
     return static_cast<const database_kind *>(dlsym(module, "tavo_postgresql_database"));
 }
 
-bool starts_with(const std::string &text, const char *start) {
-    return text.rfind(start, 0) == 0;
-}
-
-bool ends_with(const std::string &text, const std::string &end) {
-    return text.size() > end.size() && text.compare(text.size() - end.size(), end.size(), end) == 0;
-}
-
 std::string percent_decoded(const std::string &text) {
     std::string out;
     for (size_t i = 0; i < text.size(); ++i) {
@@ -39,13 +31,14 @@ std::string percent_decoded(const std::string &text) {
 }  // namespace
 
 failure find_database(const std::string &url, const database_kind **kind, std::string &location) {
+    const bool is_file = url.size() > 3 && url.substr(url.size() - 3) == ".db";
     location = url;
     std::string name;
-    if (starts_with(url, "postgresql://") || starts_with(url, "postgres://")) {
+    if (url.rfind("postgresql://", 0) == 0 || url.rfind("postgres://", 0) == 0) {
         *kind = postgresql_database();
         name = "PostgreSQL";
-    } else if (starts_with(url, "sqlite:") || ends_with(url, ".db")) {
-        if (starts_with(url, "sqlite:")) location = url.substr(7);
+    } else if (url.rfind("sqlite:", 0) == 0 || is_file) {
+        if (url.rfind("sqlite:", 0) == 0) location = url.substr(7);
         if (location.empty()) return {"sqlite: is followed by the name of a file."};
         *kind = sqlite_database();
         name = "SQLite";
@@ -58,18 +51,16 @@ failure find_database(const std::string &url, const database_kind **kind, std::s
 
 std::string without_credentials(const std::string &text, const std::string &url) {
     static const std::regex word("[^:/@?#&=%\"'(),; \n]+");
-    const size_t scheme = url.find("://");
-    const size_t last_at = url.rfind('@');
-    if (scheme == std::string::npos || last_at == std::string::npos || last_at < scheme) {
-        return text;
-    }
-    const std::string credentials = url.substr(scheme + 3, last_at - scheme - 3);
+    const size_t start = url.find("://");
+    const size_t end = url.rfind('@');
+    if (start == std::string::npos || end == std::string::npos || end < start) return text;
+    const std::string credentials = url.substr(start + 3, end - start - 3);
     const std::string words = credentials + " " + percent_decoded(credentials);
     const std::set<std::string> secret(std::sregex_token_iterator(words.begin(), words.end(), word),
                                        std::sregex_token_iterator());
     std::string out;
     auto copied = text.begin();
-    for (std::sregex_iterator found(text.begin(), text.end(), word), end; found != end; ++found) {
+    for (std::sregex_iterator found(text.begin(), text.end(), word), last; found != last; ++found) {
         if (secret.count(found->str()) == 0) continue;
         out.append(copied, (*found)[0].first).append("***");
         copied = (*found)[0].second;

@@ -1,7 +1,7 @@
 // A connection to a database. The SQL of the store is written once; database_kind holds what
 // differs between SQLite and PostgreSQL.
 //
-// Input: a location, statements and their values. Output: rows. Follows store.h.
+// Input: a location, statements and their values. Output: rows. Used by store/store.h.
 #ifndef TAVO_CLI_STORE_DATABASE_H
 #define TAVO_CLI_STORE_DATABASE_H
 
@@ -37,7 +37,7 @@ struct database_kind {
     failure (*open)(const std::string &location, bool read_only, connection &out);
 };
 
-// Finds the kind of database for a store's URL. location receives the argument for open.
+// Finds the kind of database for the URL of a store, and the location for its open function.
 failure find_database(const std::string &url, const database_kind **kind, std::string &location);
 
 // Returns the text with *** in place of every word of the URL's user name and password, that is, of

@@ -1,4 +1,4 @@
-// The module with the client library of PostgreSQL.
+// The module libtavo_postgresql.so, which needs the client library of PostgreSQL.
 #include <libpq-fe.h>
 
 #include <algorithm>
@@ -9,7 +9,7 @@
 
 namespace {
 
-constexpr Oid kBytesOid = 17;  // of the type BYTEA, fixed for all versions of the server
+constexpr Oid kBytesOid = 17;  // type BYTEA in every version of the server
 
 using database = std::shared_ptr<PGconn>;
 
@@ -22,7 +22,7 @@ std::string message_of(const database &db) {
 }
 
 // True unless the error is temporary: an error of the connection, of concurrent transactions,
-// resources or locks, or of a server that shuts down. Without a code the connection was lost.
+// resources or locks, or of a server that shuts down. A missing code means a lost connection.
 bool is_permanent(const char *sql_state) {
     if (sql_state == nullptr) return false;
     const std::string_view code_class(sql_state, 2);
@@ -51,7 +51,8 @@ failure run(const database &db, const std::string &sql, const row &values,
         data.push_back(value ? value->data() : nullptr);
         sizes.push_back(value ? static_cast<int>(value->size()) : 0);
     }
-    // The path is sent as bytes, the other values as text. The server finds out their types.
+    // The path is sent as bytes. The other values are sent as text, and the server infers their
+    // types.
     std::vector<int> formats(values.size());
     std::vector<Oid> types(values.size());
     if (!values.empty()) {
@@ -90,7 +91,7 @@ failure open_server(const std::string &location, bool /*read_only*/, connection 
 
 }  // namespace
 
-// Looked up by name in this module. The limit of a path follows from that of an index entry, a
+// The command finds this record by its name. The path is limited because an index entry may take a
 // third of a page of 8 KiB.
 extern "C" const database_kind tavo_postgresql_database = {
     "BYTEA", "TIMESTAMPTZ", "JSON", "date_trunc('second', now())", 2600,

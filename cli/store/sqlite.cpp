@@ -22,7 +22,7 @@ failure failure_of(const database &db, int code) {
     return {sqlite3_errmsg(db.get()), is_permanent};
 }
 
-// Returns SQLite's code.
+// Opens a database. Returns SQLite's code.
 int connect(const std::string &name, int flags, database &db) {
     sqlite3 *opened = nullptr;
     const int code = sqlite3_open_v2(name.c_str(), &opened, flags, nullptr);
@@ -33,8 +33,8 @@ int connect(const std::string &name, int flags, database &db) {
         return sqlite3_exec(opened, "SELECT count(*) FROM sqlite_master", nullptr, nullptr,
                             nullptr);
     }
-    // With a write-ahead log others can read at the same time, and a kill at any moment does no
-    // damage. A file that cannot be written fails at the first statement that changes it.
+    // With a write-ahead log others can read during a write, and a kill at any moment does no
+    // damage. If the file cannot be written, the first statement that changes it fails.
     sqlite3_exec(opened, "PRAGMA journal_mode=WAL; PRAGMA synchronous=NORMAL", nullptr, nullptr,
                  nullptr);
     return SQLITE_OK;
@@ -46,12 +46,6 @@ bool has_empty_log(const std::string &location) {
     std::error_code failed;
     const uintmax_t size = std::filesystem::file_size(location + "-wal", failed);
     return failed || size == 0;
-}
-
-// True if SQLite cannot create the log. The code is SQLITE_READONLY if the user lacks the
-// permission.
-bool lacks_log(int code) {
-    return (code & 0xFF) == SQLITE_CANTOPEN || (code & 0xFF) == SQLITE_READONLY;
 }
 
 cell column(sqlite3_stmt *statement, int index) {
@@ -94,7 +88,9 @@ failure open_file(const std::string &location, bool read_only, connection &out) 
     const int flags = read_only ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
     database db;
     int code = connect(location, flags, db);
-    if (read_only && lacks_log(code) && has_empty_log(location)) {
+    const int general_code = code & 0xFF;
+    const bool lacks_log = general_code == SQLITE_CANTOPEN || general_code == SQLITE_READONLY;
+    if (read_only && lacks_log && has_empty_log(location)) {
         const std::string host = location[0] == '/' ? "file://" : "file:";
         code =
             connect(host + percent_encoded(location) + "?immutable=1", flags | SQLITE_OPEN_URI, db);

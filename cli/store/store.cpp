@@ -6,6 +6,8 @@
 
 #include <algorithm>
 #include <array>
+#include <functional>
+#include <iterator>
 #include <nlohmann/json.hpp>
 
 #include "cli/run/stop.h"
@@ -31,9 +33,9 @@ constexpr int64_t kLongestWaitMs = 30'000;
 constexpr int kTableVersion = 2;
 constexpr size_t kAddedColumns = 2;
 
-enum class column_type { text, whole, real, list };  // list: of numbers, as JSON
+enum class column_type { text, whole, real, list };  // list: a JSON array of numbers
 
-// A column for a part of the result, and the part's key in JSON.
+// A column that holds a part of the result, and the key of that part in JSON.
 struct result_column {
     const char *name;
     const char *key;
@@ -56,7 +58,7 @@ constexpr result_column kResultColumns[] = {
 };
 constexpr const char *kKey = "path, mode, length_s, max_beats";
 
-// Values: the key, the size and the time of change, $1 to $6.
+// Selects the status of a song. Its values are the key, the size and the time of change, $1 to $6.
 constexpr const char *kStatusQuery =
     "SELECT status FROM songs WHERE path = $1 AND mode = $2 AND length_s = $3 AND max_beats = $4 "
     "AND size = $5 AND mtime_ns = $6";
@@ -125,26 +127,23 @@ void append_result_cells(row &cells, const std::string &text) {
     cells.insert(cells.end(), {TAVO_VERSION, as_utf8(host.data())});
 }
 
-bool is_number(const json &value) {
-    return value.is_number();
-}
-
 // Reads the text of a cell as JSON. Returns false if it is damaged.
 bool read_value(const std::string &text, column_type type, json &value) {
     if (type == column_type::text) {
         value = as_utf8(text);
         return true;
     }
-    // Nested lists are not parsed, so that their depth has no cost.
+    // A nested list is damaged. It is not parsed, because it may be very deep.
     const size_t last_bracket = text.find_last_of("[{");
     if (last_bracket != std::string::npos && last_bracket > 0) return false;
     value = json::parse(text, nullptr, false);
     if (type == column_type::whole) return value.is_number_integer();
     if (type == column_type::real) return value.is_number();
-    return value.is_array() && std::all_of(value.begin(), value.end(), is_number);
+    return value.is_array() &&
+           std::all_of(value.begin(), value.end(), std::mem_fn(&json::is_number));
 }
 
-// Reads a row of page_query. The result lacks the file's name.
+// Converts a row of page_query to a song, whose result lacks the name of the file.
 stored_song song_of(const row &cells, int32_t mode) {
     stored_song song;
     song.path = cells[0].value_or("");
@@ -171,7 +170,7 @@ std::string public_text(const store &db, const failure &failed) {
     return shown(without_credentials(failed.sentence, db.opts.store));
 }
 
-// Runs the work until it succeeds. Connects again after each temporary failure.
+// Connects and does the work. After a temporary failure both are repeated, for --patience at most.
 failure persist(store &db, const std::function<failure()> &work) {
     const auto start = steady_clock::now();
     for (int64_t wait_ms = kFirstWaitMs;; wait_ms = std::min(2 * wait_ms, kLongestWaitMs)) {
@@ -229,7 +228,7 @@ row key_of(const store &db, const std::string &path) {
             std::to_string(db.opts.max_beats)};
 }
 
-// The same, followed by the size and the time of change.
+// Returns the values of the key, the size and the time of change, in order.
 row values_of(const store &db, const std::string &path, const file_state &file) {
     row values = key_of(db, path);
     values.insert(values.end(), {std::to_string(file.size), std::to_string(file.mtime_ns)});

@@ -1,5 +1,7 @@
-// The click track of one analysis. The library ignores write errors, so the command reports them.
-// Without a request no track is written.
+// The click track of one analysis: --click. The library writes the track and ignores write errors,
+// so the command reports them. Without the option these functions do nothing.
+//
+// Input: the options and an output file for the track. Output: the track. Used by run/analyse.h.
 #ifndef TAVO_CLI_WRITE_CLICK_H
 #define TAVO_CLI_WRITE_CLICK_H
 
@@ -9,12 +11,11 @@
 #include "cli/options.h"
 #include "cli/write/output_file.h"
 
-// Sets fnamedec to the temporary file of track, or to opts.click itself if that is a device or a
-// pipe. input: the file to analyse, which the track must not replace.
+// Called before the job. Points fnamedec to the temporary file of the track, or to the file of the
+// option if that is a device or a pipe. Fails if the track would replace the input.
 failure begin_click(output_file &track, const options &opts, const std::string &input);
 
 // Called after the job. Renames a complete track to its target and removes an incomplete one.
-// Returns an empty string or an error sentence.
 failure finish_click(output_file &track, const options &opts, bool is_analysed);
 
 #endif

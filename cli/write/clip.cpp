@@ -16,8 +16,9 @@ namespace fs = std::filesystem;
 
 constexpr const char *kBitRate = "192k";  // of lossy encodings
 
-// Chooses a clip's format from that of its input. A clip in ADTS, MPEG Layer II, AC-3, Windows
-// Media, Matroska or WebM would start late, because ffmpeg states no encoder delay there.
+// The extensions of an input and of its clip. There are no clips in ADTS, MPEG Layer II, AC-3,
+// Windows Media, Matroska or WebM: they would start late, because ffmpeg states no encoder delay
+// there.
 struct audio_ending {
     const char *input;
     const char *clip;
@@ -71,7 +72,7 @@ failure write_clip(const record &result, const options &opts, const std::string 
     }
     output_file file;
     if (failure failed = begin_output(file, target, ending_of(target))) return failed;
-    // With its progress on standard output run_ffmpeg sees that ffmpeg works.
+    // The progress on standard output shows run_ffmpeg that ffmpeg is working.
     const std::vector<std::string> words = {
         "-map",          "0:a:0",  "-af",  cut_filter(result, opts),
         "-map_chapters", "-1",     "-b:a", kBitRate,

@@ -1,7 +1,7 @@
-// The highlight as an audio file, cut by the ffmpeg program: --clip.
+// The highlight as an audio file, cut out of the song by the ffmpeg program: --clip.
 //
-// In: a record with a highlight (record.h) and its song. Out: a file. Called by
-// run/worker_process.h.
+// Input: a record with a highlight (run/record.h) and its song (input/song_file.h). Output: a file.
+// Follows run/analyse.h. Used by run/worker_process.h.
 #ifndef TAVO_CLI_WRITE_CLIP_H
 #define TAVO_CLI_WRITE_CLIP_H
 
@@ -12,12 +12,13 @@
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// Returns the path of an input's clip: opts.clip, or a file in that folder with the extension of
-// the input's kind of audio.
+// Returns the path of an input's clip: opts.clip, or, if that is a folder, a file in it. The
+// extension of such a file depends on that of the input.
 std::string clip_path(const std::string &input, const options &opts);
 
-// Writes opts.length_s seconds from the highlight on, at the player's time, with fades of
-// opts.fade_s seconds at both ends. A failure is stored in result; target is then unchanged.
+// Writes opts.length_s seconds of the song, starting at the highlight, with fades of opts.fade_s
+// seconds at both ends. Times are those of a player. A failure leaves the target unchanged, and so
+// does a stop, which makes stop_fd readable.
 failure write_clip(const record &result, const options &opts, const std::string &target,
                    int stop_fd, const song_file &song);
 

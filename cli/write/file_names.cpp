@@ -27,7 +27,7 @@ struct character {
 
 // Returns the character at the start of text. Overlong forms and surrogates are not valid.
 character first_character(std::string_view text) {
-    constexpr uint32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};  // by length
+    constexpr uint32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};  // by length in bytes
     const auto lead = static_cast<uint8_t>(text[0]);
     if (lead < 0x80) return {text.substr(0, 1), lead, true};
     const size_t length = lead < 0xC2 ? 1 : lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : lead < 0xF5 ? 4 : 1;
@@ -54,17 +54,14 @@ std::vector<character> characters_of(std::string_view text) {
 // True for a character that moves the cursor or reorders text on a terminal: control characters,
 // line separators, and marks of the writing direction.
 bool is_control(uint32_t point) {
-    struct range {
-        uint32_t first, last;
+    const auto is_in = [=](uint32_t first, uint32_t last) {
+        return point >= first && point <= last;
     };
-    constexpr range kControls[] = {{0, 0x1F},        {0x7F, 0x9F},     {0x61C, 0x61C},
-                                   {0x200E, 0x200F}, {0x2028, 0x202E}, {0x2066, 0x2069}};
-    return std::any_of(std::begin(kControls), std::end(kControls), [=](const range &controls) {
-        return point >= controls.first && point <= controls.last;
-    });
+    return is_in(0, 0x1F) || is_in(0x7F, 0x9F) || point == 0x61C || is_in(0x200E, 0x200F) ||
+           is_in(0x2028, 0x202E) || is_in(0x2066, 0x2069);
 }
 
-// FNV-1a
+// Returns the FNV-1a hash.
 uint32_t hash_of(const std::string &bytes) {
     uint32_t hash = 2'166'136'261u;
     for (const char byte : bytes) hash = (hash ^ static_cast<uint8_t>(byte)) * 16'777'619u;
@@ -157,6 +154,6 @@ std::string fitting_name(const std::string &name, const std::string &suffix) {
     if (name.size() + suffix.size() <= NAME_MAX) return name + suffix;
     const std::string number = formatted("~%08x", hash_of(name));
     size_t kept = NAME_MAX - suffix.size() - number.size();
-    while (kept > 0 && (name[kept] & 0xC0) == 0x80) --kept;  // not inside a character
+    while (kept > 0 && (name[kept] & 0xC0) == 0x80) --kept;  // cut between characters
     return name.substr(0, kept) + number + suffix;
 }

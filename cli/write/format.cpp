@@ -17,7 +17,8 @@
 
 namespace {
 
-// Mean square of -10 dBFS, full scale 1: the library refines louder passages.
+// Mean square at -10 dBFS, relative to full scale. The library refines the highlight of a song with
+// louder passages.
 constexpr double kRefinedPower = 0.1;
 
 // Keys of json_object, in the order of the columns of CSV.
@@ -62,7 +63,7 @@ std::string text_record(const record &result) {
 
 // ---- CSV.
 
-// Names are written byte for byte, whatever their encoding, except to a terminal.
+// Returns the name byte for byte, whatever its encoding. On a terminal it is shown as text.
 std::string name_text(const std::string &name) {
     return isatty(STDOUT_FILENO) == 1 ? shown(name) : name;
 }
@@ -100,13 +101,14 @@ std::string csv_record(const record &result) {
     return row + "\n";
 }
 
-// ---- A template of the user: --print.
+// ---- Templates of --print.
 
 std::string seconds(double ms) {
     return formatted("%.3f", ms / 1000.0);
 }
 
-// Returns the fields and a song's values, which are empty where the song has none.
+// Returns the names of the fields and their values for a song. A value that the song lacks is
+// empty.
 std::vector<std::pair<std::string, std::string>> fields_of(const record &result) {
     const double start = player_ms(result, result.hl_pos_ms);
     const double end = player_ms(result, region_end_ms(result));

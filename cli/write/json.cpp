@@ -6,12 +6,14 @@
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
+constexpr const char *kStatusWords[] = {"ok", "failed", "stopped"};  // indexed by outcome
+
 result_json json_object(const record &result) {
     result_json object;
     object["file"] = as_utf8(result.file);
     if (object["file"] != result.file) object["file_bytes"] = percent_encoded(result.file);
     object["mode"] = mode_word(result.mode);
-    object["status"] = status_word(result.status);
+    object["status"] = kStatusWords[static_cast<int>(result.status)];
     if (result.has_stream) {
         object["sample_rate"] = result.sample_rate;
         object["channels"] = result.channels;
@@ -45,7 +47,7 @@ record record_from_json(const std::string &text) {
     const result_json object = result_json::parse(text);
     record out =
         failed_record("", mode_of(object.at("mode").get<std::string>()), object.value("error", ""));
-    if (object.at("status") == status_word(outcome::ok)) out.status = outcome::ok;
+    if (object.at("status") == kStatusWords[0]) out.status = outcome::ok;
     out.has_stream = object.contains("sample_rate");
     out.sample_rate = object.value("sample_rate", 0);
     out.channels = object.value("channels", 0);

@@ -9,10 +9,10 @@
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
-// A rate of video frames and its timecode.
+// A frame rate of video and its form of timecode.
 struct frame_rate {
     const char *name;  // as in --fps
-    int32_t frames;    // during these seconds:
+    int32_t frames;    // the rate is frames / seconds
     int32_t seconds;
     int32_t base;  // frame numbers per second of timecode
     bool drop;     // the timecode skips frame numbers to match the clock
@@ -31,10 +31,10 @@ constexpr frame_rate kRates[] = {
     {"50", 50, 1, 50, false},           {"59.94", 60000, 1001, 60, false},
     {"59.94df", 60000, 1001, 60, true}, {"60", 60, 1, 60, false},
 };
-constexpr int64_t kStartMinutes = 60;  // the timecode of frame 0, as in editors
+constexpr int64_t kStartMinutes = 60;  // timecode of frame 0, the usual start in editors
 
-// The highlight from its start to its end, or a beat, whose times are equal. Milliseconds in the
-// player's time.
+// The highlight from its start to its end, or a beat, whose start and end are equal. Times are in
+// milliseconds of the player's time.
 struct mark {
     double start_ms;
     double end_ms;
@@ -73,10 +73,10 @@ int64_t frame_count(const mark &entry, const frame_rate &rate) {
     return std::max<int64_t>(1, frame_at(entry.end_ms, rate) - frame_at(entry.start_ms, rate));
 }
 
-// Formats a timecode hh:mm:ss:ff, with a semicolon before the frames for drop-frame timecode. That
-// skips the first frame numbers of each minute, except of every tenth.
+// Formats a timecode as hh:mm:ss:ff. Drop-frame timecode has a semicolon before the frames and
+// skips the first frame numbers of each minute, except in every tenth minute.
 std::string timecode(int64_t frame, const frame_rate &rate) {
-    const int64_t dropped = rate.drop ? rate.base / 15 : 0;  // frame numbers
+    const int64_t dropped = rate.drop ? rate.base / 15 : 0;  // frame numbers per minute
     const int64_t minute = 60LL * rate.base - dropped;       // frames per minute
     const int64_t ten_minutes = 10 * minute + dropped;
     frame += kStartMinutes / 10 * ten_minutes;
@@ -89,7 +89,7 @@ std::string timecode(int64_t frame, const frame_rate &rate) {
                      seconds % 60, rate.drop ? ';' : ':', frames);
 }
 
-// ---- Text with one or a few lines per mark.
+// ---- Text formats.
 
 // Formats a time as hh:mm:ss.mmm.
 std::string clock(double ms) {
@@ -98,7 +98,8 @@ std::string clock(double ms) {
                      whole / 1000 % 60, whole % 1000);
 }
 
-// A label track: start, end and name, separated by tabs. Equal times make a point.
+// Returns a label track. Each line has the start, the end and the name, separated by tabs. Equal
+// times make a point.
 std::string audacity_labels(const record &result, const frame_rate & /*rate*/) {
     std::string out;
     for (const mark &entry : marks_of(result)) {
@@ -108,7 +109,7 @@ std::string audacity_labels(const record &result, const frame_rate & /*rate*/) {
     return out;
 }
 
-// Each line has a time, a space and the comment of the guide. A guide is a point.
+// Returns guides. Each line has a time, a space and the comment of the guide. A guide is a point.
 std::string kdenlive_guides(const record &result, const frame_rate & /*rate*/) {
     std::string out;
     for (const mark &entry : marks_of(result)) {
@@ -117,7 +118,7 @@ std::string kdenlive_guides(const record &result, const frame_rate & /*rate*/) {
     return out;
 }
 
-// The table of Reaper's region and marker manager.
+// Returns a table for Reaper's region and marker manager.
 std::string reaper_markers(const record &result, const frame_rate & /*rate*/) {
     std::string out = "#,Name,Start,End,Length\n";
     size_t regions = 0;
@@ -132,7 +133,8 @@ std::string reaper_markers(const record &result, const frame_rate & /*rate*/) {
     return out;
 }
 
-// FFmpeg's metadata file. The chapters are contiguous and begin at the start of the song.
+// Returns a metadata file of FFmpeg. Its chapters are contiguous and begin at the start of the
+// song.
 std::string ffmetadata_chapters(const record &result, const frame_rate & /*rate*/) {
     std::vector<mark> chapters;
     for (const mark &entry : marks_of(result)) {
@@ -155,7 +157,7 @@ std::string ffmetadata_chapters(const record &result, const frame_rate & /*rate*
     return out;
 }
 
-// An edit list with markers as comments, as DaVinci Resolve exports and imports them.
+// Returns an edit list with the markers as comments, in the form that DaVinci Resolve exports.
 std::string edl_markers(const record &result, const frame_rate &rate) {
     std::string out = "TITLE: " + shown(base_name(result.file)) +
                       "\nFCM: " + (rate.drop ? "DROP FRAME" : "NON-DROP FRAME") + "\n";
@@ -170,10 +172,9 @@ std::string edl_markers(const record &result, const frame_rate &rate) {
     return out;
 }
 
-// ---- Final Cut Pro's XML, version 1.8: a project with the song as its only clip, and markers on
-// it.
+// ---- Final Cut Pro's XML, version 1.8.
 
-// Returns an attribute of an element. The value is already escaped.
+// Returns an attribute of an element. The value must already be escaped.
 std::string attribute(const char *name, const std::string &value) {
     return std::string(" ") + name + "=\"" + value + "\"";
 }
@@ -183,6 +184,7 @@ std::string frames_text(int64_t frames, const frame_rate &rate) {
     return std::to_string(frames * rate.seconds) + "/" + std::to_string(rate.frames) + "s";
 }
 
+// Returns a project with the song as its only clip and the markers on the clip.
 std::string fcpxml_markers(const record &result, const frame_rate &rate) {
     const std::string name = attribute("name", xml_text(base_name(result.file)));
     const int64_t frames = frame_at(static_cast<double>(result.duration_ms), rate);
@@ -211,8 +213,8 @@ std::string fcpxml_markers(const record &result, const frame_rate &rate) {
 
 // ---- Formats based on JSON.
 
-// Segments for LosslessCut: the highlight, then one from each beat to the next or to the end of the
-// song.
+// Returns a project of LosslessCut. Its segments are the highlight, then the spans from each beat
+// to the next one or to the end of the song.
 std::string losslesscut_project(const record &result, const frame_rate & /*rate*/) {
     const std::vector<mark> marks = marks_of(result);
     json segments = json::array();
@@ -232,7 +234,7 @@ std::string losslesscut_project(const record &result, const frame_rate & /*rate*
     return project.dump(2) + "\n";
 }
 
-// A span of video frames in OpenTimelineIO.
+// Returns a span of video frames in OpenTimelineIO.
 json range(int64_t start, int64_t length, const frame_rate &rate) {
     const auto time = [&](int64_t count) {
         return json{{"OTIO_SCHEMA", "RationalTime.1"},
@@ -243,7 +245,7 @@ json range(int64_t start, int64_t length, const frame_rate &rate) {
         {"OTIO_SCHEMA", "TimeRange.1"}, {"start_time", time(start)}, {"duration", time(length)}};
 }
 
-// OpenTimelineIO: a timeline with the song as its only clip and the markers on it.
+// Returns a timeline of OpenTimelineIO with the song as its only clip and the markers on the clip.
 std::string otio_timeline(const record &result, const frame_rate &rate) {
     json markers = json::array();
     for (const mark &entry : marks_of(result)) {
@@ -279,7 +281,8 @@ const std::vector<marker_format> &marker_formats() {
     static const std::vector<marker_format> formats = {
         {"labels", ".labels.txt", false, false, audacity_labels},
         {"kdenlive", ".guides.txt", false, false, kdenlive_guides},
-        {"llc", "-proj.llc", true, false, losslesscut_project},  // found by the song's stem
+        {"llc", "-proj.llc", true, false,
+         losslesscut_project},  // LosslessCut looks for the song's stem
         {"ffmetadata", ".ffmetadata.txt", false, false, ffmetadata_chapters},
         {"edl", ".edl", false, true, edl_markers},
         {"fcpxml", ".fcpxml", false, true, fcpxml_markers},

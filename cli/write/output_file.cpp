@@ -29,15 +29,14 @@ failure exists_already(const std::string &target) {
     return {"The file " + shown(target) + " exists already; --force overwrites it."};
 }
 
-// Without force, an existing target is an error. Returns 0 or an errno value.
+// Moves a file, whose old name may remain. Without force, an existing target is an error. Returns 0
+// or an errno value.
 int move_file(const std::string &from, const std::string &to, bool force) {
     if (force) return rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
     if (renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
     if (errno != EINVAL && errno != ENOSYS) return errno;
-    // Where the file system lacks that operation, use link, which also fails if the target exists.
-    if (link(from.c_str(), to.c_str()) != 0) return errno;
-    unlink(from.c_str());
-    return 0;
+    // The file system lacks that operation. A link also fails if the target exists.
+    return link(from.c_str(), to.c_str()) == 0 ? 0 : errno;
 }
 
 }  // namespace
@@ -83,13 +82,9 @@ failure commit_output(output_file &file, bool force) {
     int code = file.fd >= 0 && close(file.fd) != 0 ? errno : 0;
     file.fd = -1;
     if (code == 0) code = move_file(file.temporary, file.target, force);
-    if (code == 0) {
-        forget_temporary_file(file.temporary);
-        file.temporary.clear();
-        return {};
-    }
     abandon_output(file);
-    return code == EEXIST ? exists_already(file.target) : write_failure(file.target, code);
+    if (code == EEXIST) return exists_already(file.target);
+    return code == 0 ? failure() : write_failure(file.target, code);
 }
 
 void abandon_output(output_file &file) {

@@ -1,4 +1,4 @@
-// Output files, written atomically.
+// Output files, written atomically: a target is replaced by a complete file or stays unchanged.
 #ifndef TAVO_CLI_WRITE_OUTPUT_FILE_H
 #define TAVO_CLI_WRITE_OUTPUT_FILE_H
 
@@ -9,7 +9,7 @@
 // A temporary file in the folder of the target, with the permissions of a new file.
 struct output_file {
     std::string target;
-    std::string temporary;  // empty if nothing is left to remove
+    std::string temporary;  // path; empty before begin_output and after the file is gone
     int fd = -1;            // open for writing, or -1
 };
 
@@ -20,12 +20,13 @@ bool same_file(const std::string &a, const std::string &b);
 // does not exist. Creates nothing.
 failure check_target(const std::string &target, bool force);
 
-// Creates the temporary file. ending: its extension, for programs that need one.
+// Creates the temporary file. Its name ends in `ending`, for programs that choose a format from the
+// extension.
 failure begin_output(output_file &file, const std::string &target, const std::string &ending = "");
 failure write_output(output_file &file, const std::string &content);
 
-// Renames the file to its target. Without force an existing target is kept and the temporary file
-// is removed.
+// Renames the temporary file to the target, or removes it after a failure. Without force an
+// existing target is a failure.
 failure commit_output(output_file &file, bool force);
 
 // Removes the temporary file. Does nothing after a commit or a previous call.

@@ -12,7 +12,6 @@
 namespace {
 
 constexpr const char *kModeWords[] = {"highlight", "beats", "both"};  // indexed by TAVO_MODE_*
-constexpr const char *kStatusWords[] = {"ok", "failed", "stopped"};   // indexed by outcome
 
 std::string seconds_text(long long seconds) {
     const long long hours = seconds / 3600;
@@ -40,10 +39,6 @@ int32_t mode_of(const std::string &word) {
     int32_t mode = TAVO_MODE_HIGHLIGHT;
     while (mode < TAVO_MODE_BOTH && word != kModeWords[mode]) ++mode;
     return mode;
-}
-
-const char *status_word(outcome status) {
-    return kStatusWords[static_cast<int>(status)];
 }
 
 std::string whole_clock_text(double ms) {
