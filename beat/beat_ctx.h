@@ -1,7 +1,7 @@
 // Sets up stage 4: creates the context of one beat analysis and the lock of its worker groups.
 //
 // Input: a TAVO_CTX with ana, ana_len, ana_rate and onset. Output: a TAVO_BEAT_CTX, which lives for
-// one call of getBeatPosition.
+// one call to getBeatPosition.
 #ifndef TAVO_BEAT_BEAT_CTX_H
 #define TAVO_BEAT_BEAT_CTX_H
 

@@ -84,7 +84,7 @@ CLI::Option *add_text(CLI::App &app, const char *names, std::string &value, cons
     return app.add_option(names, value, description)->type_name(type);
 }
 
-// Declares an option with a whole number as value. type: SECONDS or N.
+// Declares an option with a whole number as its value. type: SECONDS or N.
 void add_number(CLI::App &app, const char *names, int32_t &value, std::pair<int32_t, int32_t> range,
                 const std::string &type, const char *description) {
     const auto check = [=](const std::string &text) {

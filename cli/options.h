@@ -15,7 +15,7 @@ enum class result_format {
     json,
     csv,
     markers,  // one file per input, in the format options.markers
-    // The next two have no word for --format.
+    // The next two are not values of --format.
     print,  // --print
     none,   // no output, because the store has the results
 };

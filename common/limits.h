@@ -1,4 +1,4 @@
-// Limits of the files that can be analysed. The stages refuse files outside these limits; the
+// Limits on the files that can be analysed. The stages refuse files outside these limits; the
 // command prints the limits for the user.
 #ifndef TAVO_COMMON_LIMITS_H
 #define TAVO_COMMON_LIMITS_H

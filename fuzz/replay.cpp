@@ -18,8 +18,8 @@ size_t below(size_t limit) {
     return limit == 0 ? 0 : random_numbers() % limit;
 }
 
-// Returns random bytes, or a kept input with random choices at its end and some changed bytes, half
-// of the time only near its start. Either may be truncated.
+// Returns random bytes, or a kept input with random choices at its end and some bytes changed (half
+// of the time only near its start). Either may be truncated.
 bytes next_input(const std::vector<bytes> &kept) {
     const auto random_byte = [] { return static_cast<uint8_t>(random_numbers()); };
     const bool random_only = below(2) == 0;

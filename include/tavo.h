@@ -177,7 +177,7 @@ void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback);
 
 /** Stores a listener instead of a callback, and a pointer that is passed to the listener but not
  * otherwise used. Call it before tavo_analyze, on an instance that tavo_init returned. The last
- * call of tavo_setcallback or tavo_set_listener takes effect. A null listener removes the stored
+ * call to tavo_setcallback or tavo_set_listener takes effect. A null listener removes the stored
  * one. Returns 0, or -4 for a bad handle, with nothing stored. */
 int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 

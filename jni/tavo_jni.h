@@ -1,7 +1,7 @@
 // Stage 8: the Java bridge.
 //
-// Input: calls of the native methods of com.kestu.tavo.Tavo, for one instance per process. Output:
-// one call of the static method postEventFromNative per job, on the job's worker thread. Follows
+// Input: calls to the native methods of com.kestu.tavo.Tavo, for one instance per process. Output:
+// one call to the static method postEventFromNative per job, on the job's worker thread. Follows
 // include/tavo.h and precedes java/com/kestu/tavo/Tavo.java.
 #ifndef TAVO_JNI_TAVO_JNI_H
 #define TAVO_JNI_TAVO_JNI_H

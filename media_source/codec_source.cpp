@@ -6,7 +6,7 @@
 
 namespace {
 
-// State of one call of codec_source_get_frm.
+// State of one call to codec_source_get_frm.
 struct decoding {
     const codec_source *source;
     wexa_output output;

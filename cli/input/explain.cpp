@@ -44,7 +44,7 @@ std::string explain_format(file_kind kind) {
     }
 }
 
-// Returns the reason for a code of tavo_probe.
+// Returns the reason for a tavo_probe code.
 std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream) {
     const std::string subject = std::string("The ") + kind_name(kind) + " file ";
     switch (code) {

@@ -10,7 +10,7 @@
 
 #include "include/tavo.h"
 
-// Returns the reason for `code`, which tavo_probe returned with `stream`, or TAVO_ERR_MEMORY.
+// Returns the reason for `code`: what tavo_probe returned with `stream`, or TAVO_ERR_MEMORY.
 std::string explain_refusal(const std::string &path, int32_t code, const TAVO_STREAM &stream);
 
 // Returns the reason why an analysis received no audio, or (has_audio) only the beginning.

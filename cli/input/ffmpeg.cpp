@@ -19,7 +19,7 @@ constexpr size_t kRateOffset = 24;                            // of a WAV header
 constexpr size_t kHeaderBytes = 44;                           // of ffmpeg's header without tags
 constexpr int64_t kMostWavBytes = (int64_t{1} << 32) - 4096;  // a WAV file has 32-bit sizes
 
-// Limit of a file's decoded sound: one minute plus this many samples per byte. Silence has about a
+// Limit on a file's decoded sound: one minute plus this many samples per byte. Silence has about a
 // thousand in the most compact codecs. Without the limit a wrong time stamp could add hours.
 constexpr int64_t kMostSamplesPerByte = 2048;
 constexpr int64_t kSpareSeconds = 60;
@@ -30,7 +30,7 @@ constexpr const char *kMediaSuffixes[] = {
     ".mka", ".mkv", ".mov", ".mp4",  ".mpc",  ".mpeg", ".mpg", ".opus", ".spx",
     ".tak", ".tta", ".voc", ".w64",  ".wav",  ".webm", ".wma", ".wmv",  ".wv"};
 
-// The sound of one run of ffmpeg.
+// The output of one ffmpeg run.
 struct decoding {
     int fd;              // destination
     int64_t file_bytes;  // of the encoded file

@@ -1,7 +1,7 @@
-// Decodes files that the library refuses, with the ffmpeg program.
+// Uses the ffmpeg program to decode files that the library refuses.
 //
-// In: a file. Out: a WAV file in memory for the library: one channel of 16 bits, at the file's own
-// rate or the nearest supported one, on the time line of players. Called by song_file.h.
+// In: a file. Out: a WAV file in memory for the library: 16-bit mono, at the file's own rate or
+// the nearest supported one, on a player's timeline. Called by song_file.h.
 #ifndef TAVO_CLI_INPUT_FFMPEG_H
 #define TAVO_CLI_INPUT_FFMPEG_H
 

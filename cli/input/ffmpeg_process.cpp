@@ -26,7 +26,7 @@
 namespace {
 
 constexpr size_t kMostMessageBytes = 65536;  // only the first line is used
-// Limit of the address space. A damaged file can make ffmpeg allocate hours of silence at once.
+// Limit on the address space. A damaged file can make ffmpeg allocate hours of silence at once.
 constexpr rlim_t kMostProgramBytes = rlim_t{448} << 20;
 constexpr int kReadPollMs = 1000;  // between two checks of the clock
 constexpr int kEndPollMs = 10;     // between two checks for the end of the program

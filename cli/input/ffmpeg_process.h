@@ -28,12 +28,12 @@ std::string find_ffmpeg();
 
 // Runs the program and waits until it has ended. It is killed at a stop (stop_fd readable or closed
 // at its other end) or if it writes nothing for kIdleSeconds. It can read only the given file, and
-// nothing from the network. A failure is a sentence with the first line of the program's messages.
+// nothing from the network. A failure quotes the first line of the program's messages.
 failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink);
 
 constexpr int kIdleSeconds = 30;
 
-// Like a player, this filter starts the time line at 0 and fills gaps with silence.
+// Like a player, this filter starts the timeline at 0 and fills gaps with silence.
 constexpr const char *kPlayerTimeFilter = "aresample=async=1:first_pts=0";
 
 #endif

@@ -104,7 +104,7 @@ double time_scale(std::string_view header) {
 }
 
 // Reads the first edits of a track. Empty edits delay the track; the first other edit drops
-// everything before its media time. False if there is no edit.
+// everything before its media time. Returns false if there is no edit.
 bool read_edits(std::string_view list, double movie_scale, double media_scale, double &ms) {
     const bool is_long = big_endian(list, 0, 1) == 1;
     const size_t field = is_long ? 8 : 4;
@@ -123,7 +123,7 @@ bool read_edits(std::string_view list, double movie_scale, double media_scale, d
     return false;
 }
 
-// Reads the encoder's delay from "iTunSMPB": the second hexadecimal number, in samples.
+// Reads the encoder delay from "iTunSMPB": the second hexadecimal number, in samples.
 double tag_offset_ms(const std::string &movie, int32_t rate) {
     const size_t name = movie.find("iTunSMPB");
     const size_t data = name == std::string::npos ? name : movie.find("data", name);

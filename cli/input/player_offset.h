@@ -1,5 +1,5 @@
 // The difference between the library's times and a player's. The library counts from the first
-// sample that it decodes, but players drop the encoder's delay, which the file states.
+// sample that it decodes, but players drop the encoder delay, which the file states.
 //
 // In: an MP3 or MP4 file. Out: milliseconds for record.h. docs/FORMATS.md has the table.
 #ifndef TAVO_CLI_INPUT_PLAYER_OFFSET_H

@@ -21,7 +21,7 @@ struct song_file {
 // any other file. After a failure there is nothing to close.
 failure open_song(const std::string &path, int stop_fd, song_file &song);
 
-// Replaces the song by the output of ffmpeg. After a failure, or without ffmpeg, the song is
+// Replaces the song with the output of ffmpeg. After a failure, or without ffmpeg, the song is
 // unchanged.
 failure decode_song(const std::string &path, const options &opts, int stop_fd, song_file &song);
 

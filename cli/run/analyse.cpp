@@ -97,8 +97,8 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, const song_file &s
 
 void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out);
 
-// Replaces a coarse highlight by that of the amplified song. In mode both the result does not show
-// whether the highlight is coarse, so the song is searched again.
+// Replaces a coarse highlight with that of the amplified song. A result of mode both does not show
+// whether its highlight is coarse, so the song is searched again.
 void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record &out) {
     options search = opts;
     search.mode = TAVO_MODE_HIGHLIGHT;

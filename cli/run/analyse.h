@@ -1,7 +1,7 @@
 // Analyses one file: creates an instance of the library, runs its job and releases it.
 //
 // In: a path and options. Out: a record. Runs in a worker process (worker_process.h), which has at
-// most one instance at a time. After: format.h.
+// most one instance at a time. Precedes write/format.h.
 #ifndef TAVO_CLI_RUN_ANALYSE_H
 #define TAVO_CLI_RUN_ANALYSE_H
 

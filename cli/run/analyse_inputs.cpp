@@ -48,7 +48,7 @@ void accept_result(run_state &state, job &&done, reply &&answer) {
     accept_reply(state.output, done.message.index, std::move(answer));
 }
 
-// Finds the next input of the command line or of the store.
+// Finds the next input from the command line or the store.
 supply_state find_next(run_state &state, job &next) {
     if (!state.opts.from_store) {
         input entry;

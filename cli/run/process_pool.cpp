@@ -23,8 +23,8 @@ using std::chrono::steady_clock;
 
 constexpr milliseconds kStopPatience{1000};
 
-// Runs in the new process. It closes the sockets of the other workers, because a copy left open
-// would hide the end of the command from them.
+// Runs in the new process. It closes the sockets of the other workers, because with a copy left
+// open they would not notice that the command has ended.
 [[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_files &files, int fd) {
     for (worker_process &other : pool.processes) close_fd(other.fd);
     ignore_stop_signals();

@@ -1,10 +1,9 @@
 // Starts, feeds, stops and reaps the worker processes. The library allows one instance per process,
-// so workers are needed to analyse several files at once. A crash of a worker affects one file
-// only.
+// so workers are needed to analyse several files at once. A crashing worker affects one file.
 //
 // The command and a worker are connected by a pair of sockets. When the command closes its end for
-// writing, the worker stops its analysis and ends. When a worker ends, the command reads the end of
-// its replies. The command is single-threaded, so that it can fork at any moment.
+// writing, the worker stops its analysis and ends. When a worker ends, the command reads
+// end-of-file from it. The command is single-threaded, so that it can fork at any moment.
 #ifndef TAVO_CLI_RUN_PROCESS_POOL_H
 #define TAVO_CLI_RUN_PROCESS_POOL_H
 

@@ -148,7 +148,7 @@ std::string serve(const request &message, const options &opts, int stop_fd) {
     }
 }
 
-// Each job reuses the heap of the one before instead of asking the system for new pages. The heap
+// Each job reuses the heap of the previous one instead of asking the system for new pages. The heap
 // starts large enough for a song, in huge pages: one page fault instead of 512.
 void prepare_heap() {
     mallopt(M_TRIM_THRESHOLD, kFreeMemoryKept);

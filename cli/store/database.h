@@ -18,7 +18,7 @@ using row = std::vector<cell>;
 using row_reader = std::function<void(const row &)>;  // may be null
 
 // An open connection: runs a statement with the values $1, $2 ... and passes on each row that it
-// returns. $1 is always a path. Failures have the database's own text. They are permanent if the
+// returns. $1 is always a path. Failures carry the database's message. They are permanent if the
 // file is damaged, or if a table or a permission is missing.
 using connection =
     std::function<failure(const std::string &sql, const row &values, const row_reader &on_row)>;

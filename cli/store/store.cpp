@@ -58,7 +58,7 @@ constexpr result_column kResultColumns[] = {
 };
 constexpr const char *kKey = "path, mode, length_s, max_beats";
 
-// Selects the status of a song. Its values are the key, the size and the time of change, $1 to $6.
+// Selects a song's status. The values are the key, the size and the modification time, $1 to $6.
 constexpr const char *kStatusQuery =
     "SELECT status FROM songs WHERE path = $1 AND mode = $2 AND length_s = $3 AND max_beats = $4 "
     "AND size = $5 AND mtime_ns = $6";
@@ -80,7 +80,7 @@ std::vector<std::string> upgrade_statements(const database_kind &kind) {
 }
 
 // Returns the statement that inserts a row or replaces the one with its key. Its values are those
-// of the key, the size and the time of change, and the cells of append_result_cells.
+// of the key, the size, the modification time and the cells of append_result_cells.
 std::string put_statement(const database_kind &kind) {
     std::vector<std::string> others = {"size", "mtime_ns"};
     for (const result_column &column : kResultColumns) others.emplace_back(column.name);
@@ -170,7 +170,7 @@ std::string public_text(const store &db, const failure &failed) {
     return shown(without_credentials(failed.sentence, db.opts.store));
 }
 
-// Connects and does the work. After a temporary failure both are repeated, for --patience at most.
+// Connects and does the work. After a temporary failure both are repeated for at most --patience.
 failure persist(store &db, const std::function<failure()> &work) {
     const auto start = steady_clock::now();
     for (int64_t wait_ms = kFirstWaitMs;; wait_ms = std::min(2 * wait_ms, kLongestWaitMs)) {
@@ -228,7 +228,7 @@ row key_of(const store &db, const std::string &path) {
             std::to_string(db.opts.max_beats)};
 }
 
-// Returns the values of the key, the size and the time of change, in order.
+// Returns the values of the key, the size and the modification time.
 row values_of(const store &db, const std::string &path, const file_state &file) {
     row values = key_of(db, path);
     values.insert(values.end(), {std::to_string(file.size), std::to_string(file.mtime_ns)});

@@ -49,8 +49,8 @@ struct store {
 // Connects and, unless the store is only read, creates or upgrades the table. Does not retry.
 failure open_store(store &db, const options &opts);
 
-// The following functions retry while the database does not answer, with growing pauses, for
-// --patience. Each pause is reported on standard error and ends at a stop. After a failure the
+// The following functions retry while the database does not answer, with growing pauses, for at
+// most --patience. Each pause is reported on standard error and ends at a stop. After a failure the
 // store is no longer used.
 
 // Sets is_new if the song must be analysed: its current file is not stored for these parameters, or

@@ -11,7 +11,7 @@
 #include "cli/options.h"
 #include "cli/write/output_file.h"
 
-// Called before the job. Points fnamedec to the temporary file of the track, or to the file of the
+// Called before the job. Points fnamedec at the temporary file of the track, or at the file of the
 // option if that is a device or a pipe. Fails if the track would replace the input.
 failure begin_click(output_file &track, const options &opts, const std::string &input);
 

@@ -19,12 +19,12 @@ std::string as_utf8(const std::string &bytes);
 // Replaces each character that has a replacement.
 std::string replaced(const std::string &text, const std::map<char, const char *> &replacements);
 
-// Return valid UTF-8 with & < > and " as entities. xml_text also replaces the characters that XML
-// forbids by U+FFFD.
+// Return valid UTF-8 with & < > and " as entities. xml_text also writes U+FFFD for characters that
+// XML forbids.
 std::string html_text(const std::string &bytes);
 std::string xml_text(const std::string &bytes);
 
-// Returns the text with every byte except A-Z a-z 0-9 - . _ ~ / as %NN.
+// Encodes every byte except A-Z a-z 0-9 - . _ ~ / as %NN.
 std::string percent_encoded(const std::string &bytes);
 
 // Returns a path without its folders.

@@ -99,7 +99,7 @@ std::string clock(double ms) {
 }
 
 // Returns a label track. Each line has the start, the end and the name, separated by tabs. Equal
-// times make a point.
+// times mark a point.
 std::string audacity_labels(const record &result, const frame_rate & /*rate*/) {
     std::string out;
     for (const mark &entry : marks_of(result)) {

@@ -21,7 +21,7 @@ struct marker_format {
     std::string (*content)(const record &result, const frame_rate &rate);
 };
 
-// Returns all formats in the order of the help.
+// Returns all formats in the order of --help.
 const std::vector<marker_format> &marker_formats();
 
 // Returns null for any other word.

@@ -59,7 +59,7 @@ TEST(Beats, PowerRiseForcesABeat) {
     EXPECT_NEAR(run.ctx.onset->beat_times[0], 50000.0, 100.0);
 }
 
-// A stop has an effect before the envelope and after the tempo, but not later.
+// A stop takes effect before the envelope and after the tempo, but not later.
 TEST(Beats, StopIsCheckedBeforeTheEnvelopeAndAfterTheTempo) {
     for (const auto &[start, tempo, beats] :
          {std::tuple{0, false, false}, {1, true, false}, {5, true, true}}) {

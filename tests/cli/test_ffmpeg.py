@@ -34,7 +34,7 @@ NAMING_OTHERS = {"a.m3u8": b"#EXTM3U\n#EXT-X-TARGETDURATION:60\n#EXTINF:60,\na.t
 
 
 def find(part, sound):
-    """Returns the position in the sound that is most similar to its part, in samples."""
+    """Returns the sample at which the part best matches the sound."""
     size = len(part) + len(sound)
     return np.fft.irfft(np.fft.rfft(sound, size) * np.fft.rfft(part, size).conj(), size).argmax()
 
@@ -55,7 +55,7 @@ class Ffmpeg(Case):
         return {"env": {"PATH": f"{program.parent}:/usr/bin:/bin"}}
 
     def sound(self, path, filters="aresample=async=1:first_pts=0"):
-        """Returns the samples of a file that a player plays."""
+        """Returns the samples that a player plays."""
         words = ["-i", path, "-af", filters, "-ac", "1", "-ar", str(RATE), "-f", "s16le", "-"]
         done = subprocess.run(["ffmpeg", "-nostdin", "-v", "error", *words], cwd=self.folder, check=True, capture_output=True)
         return np.frombuffer(done.stdout, np.int16).astype(float)

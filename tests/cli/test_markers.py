@@ -93,7 +93,7 @@ class Markers(Case):
         self.assert_marks(segments, marks[:1] + until_next([(m[0], m[2]) for m in marks[1:]], self.end))
 
     def test_chapters(self):
-        """The song is an MP3 file, because players skip the delay of its encoder."""
+        """The song is an MP3 file, because players skip its encoder delay."""
         subprocess.run(["lame", "--quiet", standard_song(), self.folder / NAME], check=True)
         for words in ("--length 12", "--length 12 --mode highlight"):
             path, marks = self.write("ffmetadata", words)

@@ -73,7 +73,7 @@ class Results(Case):
             self.assertEqual(list(result), KEYS + keys)
             self.assertEqual([result[key] for key in KEYS], ["song.wav", mode, "ok", 44100, 2, 60000, 0])
             if mode != "beats":
-                # In mode both the highlight of a WAV file is at a whole second.
+                # In mode both, the highlight of a WAV file is at a whole second.
                 self.assertAlmostEqual(result["hl_pos_ms"], 20000, delta=1000)
                 self.assertEqual(result["hl_end_ms"], result["hl_pos_ms"] + 12000)
             if mode != "highlight":

@@ -1,4 +1,4 @@
-"""Tests --store. Each song is stored once, with the result that it has without a store."""
+"""Tests --store. Each song is stored once, with the same result as without --store."""
 import json
 import os
 import random
@@ -117,7 +117,7 @@ class Store(Case):
         self.assertEqual(self.run_json(*STORE, "--from-store", "--length", "5", before=AS_ORDINARY_USER), expected)
 
     def test_markers_of_a_run_that_was_killed(self):
-        """After a run was killed, marker files may exist whose songs are not in the store."""
+        """A killed run may leave marker files of songs that are not in the store."""
         names = self.put_songs(3)
         words = (*STORE, "--format", "labels", *names)
         self.run_tavo(*words)

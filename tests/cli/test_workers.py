@@ -27,7 +27,7 @@ class Workers(Case):
     def setUp(self):
         super().setUp()
         self.put("a.wav")
-        # The samples are constant, because only the time of the analysis matters.
+        # The samples are constant, because only the analysis time matters.
         self.put("long.wav", wav(seconds=600, rate=48000, channels=2))
         os.link(self.folder / "long.wav", self.folder / "other.wav")
 

@@ -52,7 +52,7 @@ TEST(Jobs, BeatsFallOnTheDrums) {
     EXPECT_GE(on_hits * 10, result.beat_count * 9);
 }
 
-// Mode 2 finds the beats that mode 1 finds in a file that starts at the highlight of mode 2.
+// Mode 2 finds the same beats as mode 1 in a copy of the file that starts at the highlight.
 TEST(Jobs, BothFindsTheBeatsOfTheRestOfTheFile) {
     const job::result both = run(core_song::whole().path, TAVO_MODE_BOTH, 7);
     ASSERT_GT(both.hl_pos, 1000);

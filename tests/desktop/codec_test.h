@@ -87,7 +87,7 @@ inline void expect_equal(const samples &got, const samples &expected) {
     EXPECT_EQ(differs - got.begin(), static_cast<ptrdiff_t>(got.size())) << "the first to differ";
 }
 
-// Returns a callback record for direct calls of the codec library. `path` must outlive it.
+// Returns a callback record for direct calls to the codec library. `path` must outlive it.
 inline mtsrc_io io_for(const std::string &path) {
     mtsrc_io io = {};
     mtsrc_file_callbacks(&io);

@@ -22,7 +22,7 @@ namespace {
 constexpr unsigned kMaxSeconds = 30;  // of one job
 constexpr long kMaxMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
-// Without TAVO_FAULTS only kCalls calls of each function and every kStep-th wrong value are tried.
+// Without TAVO_FAULTS only kCalls calls to each function and every kStep-th wrong value are tried.
 constexpr int kCalls = 2, kStep = 31;
 
 // Returns wrong values: some near the limits of the named value, and some for any value.
@@ -64,7 +64,7 @@ int64_t apply_fault(const std::string &function, const std::string &value, int64
     return now.replacement;
 }
 
-// Returns a stream of the song. Its duration is stated too long, so that jobs read to the end.
+// Returns a stream of the song. Its stated duration is too long, so that jobs read to the end.
 fake_codec::stream_spec stream_of(const support::song &song) {
     fake_codec::stream_spec stream;
     stream.sample_rate = song.plan.rate;

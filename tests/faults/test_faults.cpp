@@ -1,4 +1,4 @@
-// Runs jobs in which a call of a memory, thread, lock or file function fails, alone or with all
+// Runs jobs in which a call to a memory, thread, lock or file function fails, alone or with all
 // later ones. Nothing crashes, hangs or leaks, and each job calls back once. TAVO_FAULTS=all tries
 // every call.
 #include <fcntl.h>
@@ -102,7 +102,7 @@ const char *find_broken_promise(const outcome &found, int mode, const group &kin
     return in_song ? job::find_inconsistency(a, mode) : "beats outside the song";
 }
 
-// Runs the job `count` times. Each time another call fails; these calls are evenly spread.
+// Makes about `count` calls fail in turn, evenly spread, each alone and with all later ones.
 void try_calls(const std::string &path, int mode, const group &kind, int64_t count) {
     fault::plan plan = {kind.calls, INT64_MAX, false, kind.error};
     const outcome undisturbed = run(path, mode, plan);

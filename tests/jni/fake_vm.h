@@ -33,11 +33,11 @@ std::atomic<int> misplaced_calls;  // number of calls made while an exception wa
 
 // The settings that a test makes, and the events that the machine recorded.
 struct {
-    // The n-th call of this function fails; 1 is the next call. As the interface specifies, it
+    // The n-th call to this function fails; 1 is the next call. As the interface specifies, it
     // returns null with an exception pending, or it returns an error code.
     std::string failing = {};
     int nth = 1;
-    // Each call of this function runs the action, on the thread of the call.
+    // Each call to this function runs the action on the calling thread.
     std::string watched = {};
     std::function<void()> action = {};
 

@@ -31,7 +31,7 @@ fake_codec::frame with_decoded_bytes(int32_t bytes) {
     return frame;
 }
 
-// Returns the samples that a source delivers for pair frames: one per frame, but both in Ogg.
+// Returns the samples that a source delivers for pair frames: one per frame, two in Ogg.
 samples expected_of(const source_row &row, const samples &values) {
     samples out;
     for (const int16_t value : values) out.insert(out.end(), row.codec == 323 ? 2 : 1, value);

@@ -113,7 +113,7 @@ class Installed(unittest.TestCase):
             report = subprocess.run(["hardening-check", path], text=True, stdout=subprocess.PIPE).stdout
             for property_name in ("Stack protected", "Read-only relocations", "Immediate binding", *also):
                 self.assertIn(f" {property_name}: yes", report, path)
-            # hardening-check does not recognise control-flow protection here, so its instruction is searched.
+            # hardening-check does not recognise control-flow protection here, so the test looks for its instruction.
             if platform.machine() == "x86_64":
                 self.assertIn("endbr64", run("objdump", "-d", path), path)
 

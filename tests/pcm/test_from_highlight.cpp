@@ -53,8 +53,8 @@ TEST_F(FromHighlight, FirstSecondIsTheStartOfTheFile) {
 }
 
 TEST_F(FromHighlight, SeekPositionIsFoundInThePcm) {
-    // After a seek to 2500 ms, byte 40,000, the decoded block is searched in bytes 24,000 to 87,999
-    // of the PCM. If it is not found there, the rest of the song is decoded again.
+    // After a seek to 2500 ms, byte 40,000, the decoded block is searched for in bytes 24,000 to
+    // 87,999 of the PCM. If it is not found there, the rest of the song is decoded again.
     const struct {
         const char *name;
         uint32_t ms;             // position that the seek reports
@@ -107,7 +107,7 @@ TEST_F(FromHighlight, SecondDecodingReleasesTheFirst) {
 }
 
 // The record is a heap block of its own, so that a sanitizer detects a read of another record. The
-// block is searched only in the bytes that the record's duration covers.
+// audio is searched for only in the bytes that the record's duration covers.
 TEST_F(FromHighlight, ComparisonReadsOnlyItsRecord) {
     ASSERT_EQ(plan(kDuration, kRate, stream), 0);
     const auto seg = std::make_unique<TAVO_DECSEG>();

@@ -16,7 +16,7 @@ inline std::string zeros(size_t count) {
     return std::string(count, '\0');
 }
 
-// Returns random bytes. No sequence of 200 bytes occurs in them twice.
+// Returns random bytes. No sequence of 200 bytes occurs twice.
 inline std::string noise(size_t count, std::mt19937::result_type seed) {
     std::string bytes(count, '\0');
     std::mt19937 random(seed);

@@ -1,4 +1,4 @@
-// Makes calls of memory, thread, lock and file functions fail, on any thread. Only calls from
+// Makes calls to memory, thread, lock and file functions fail, on any thread. Only calls from
 // objects that are linked into the program are affected, so the program links the library's
 // objects.
 #ifndef TAVO_TESTS_SUPPORT_FAULT_LAYER_H

@@ -1,4 +1,4 @@
-"""Tests tavo.html in a browser: it opens files of every format and gives the results of the command."""
+"""Tests tavo.html in a browser: it opens files of every format and gives the command's results."""
 import base64
 import os
 import pathlib

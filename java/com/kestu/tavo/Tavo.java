@@ -94,7 +94,7 @@ public final class Tavo implements AutoCloseable {
      * Returns true if the analysis decoded the file to its end. Otherwise the event is a
      * failure. The value is valid from the event until {@link #deinit}.
      *
-     * @return true if so; false if not, before the event, after a stop or without {@link #init}
+     * @return true if complete; always false before the event, after a stop or without {@code init}
      */
     public native boolean isComplete();
 

@@ -1,7 +1,7 @@
 package com.kestu.tavo;
 
 /**
- * Receives the result of an analysis through exactly one call of one of these methods.
+ * Receives the result of an analysis through exactly one call to one of these methods.
  *
  * <p>Both methods run on a thread of the library, never on the thread that called
  * {@link Tavo#analyze}. Pass the values to your own thread before you touch a user interface.
