@@ -1,5 +1,5 @@
-// How every part of the command reports that something went wrong: functions that can fail return a
-// failure, which is false after success.
+// The result of every function of the command that can fail. A failure converts to false after
+// success.
 //
 //     if (failure failed = write_file(target, content, force)) return failed;
 #ifndef TAVO_CLI_FAILURE_H

@@ -27,7 +27,7 @@ constexpr const char *kExamples =
     "  tavo --report song.html song.mp3    a page that shows and plays the song\n"
     "  find . -name '*.flac' -print0 | tavo -0 -f csv -\n";
 
-// For -h; a test compares it with the options.
+// Printed by -h. A test compares it with the options.
 constexpr const char *kOptionNames =
     "Options, which --help explains:\n"
     "  Input      FILE, -r --recursive, --files-from LIST, -0 --null\n"

@@ -2,7 +2,6 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
-#include <charconv>
 #include <cstdio>
 #include <filesystem>
 #include <iostream>
@@ -10,7 +9,7 @@
 #include <utility>
 
 #include "cli/help_text.h"
-#include "cli/input/ffmpeg_process.h"
+#include "cli/input/ffmpeg.h"
 #include "cli/input/shard.h"
 #include "cli/write/file_names.h"
 #include "cli/write/format.h"
@@ -27,7 +26,7 @@ constexpr int32_t kMostBeats = 1'000'000'000;
 constexpr size_t kOptionColumns = 28;  // width of the names in --help
 constexpr size_t kTextColumns = 80 - kOptionColumns;
 
-// In the order of result_format.
+// Words of --format, in the order of result_format.
 const std::vector<std::string> kFormats = {"text", "json", "csv"};
 
 std::vector<std::string> format_words() {
@@ -60,8 +59,8 @@ int wrong_usage(const std::string &sentence) {
     return kExitUsage;
 }
 
-// The parser splits a value in square brackets at its commas. For file names `shielded` prevents
-// this with a byte before the bracket, which `unshield` removes.
+// The parser splits a FILE in square brackets at its commas. `shielded` prevents this with a byte
+// before each bracket, which is removed again when the value is checked.
 constexpr char kShield = '\x01';
 
 // Returns the arguments in the order that the parser requires, last to first.
@@ -74,24 +73,18 @@ std::vector<std::string> shielded(int argc, char **argv) {
     return out;
 }
 
-void unshield(std::string &value) {
-    if (value.size() > 1 && value[0] == kShield && value[1] == '[') value.erase(0, 1);
-}
-
 // Declares an option with a text value.
 CLI::Option *add_text(CLI::App &app, const char *names, std::string &value, const char *type,
                       const char *description) {
     return app.add_option(names, value, description)->type_name(type);
 }
 
-// Declares an option with a whole number as its value. type: SECONDS or N.
+// Declares an option whose value is a whole number. `type` is SECONDS or N.
 void add_number(CLI::App &app, const char *names, int32_t &value, std::pair<int32_t, int32_t> range,
                 const std::string &type, const char *description) {
     const auto check = [=](const std::string &text) {
-        int32_t number = 0;
-        const auto end = std::from_chars(text.data(), text.data() + text.size(), number);
-        const bool is_number = end.ec == std::errc() && end.ptr == text.data() + text.size();
-        if (is_number && number >= range.first && number <= range.second) return std::string();
+        const std::optional<int64_t> number = read_number(text);
+        if (number && *number >= range.first && *number <= range.second) return std::string();
         return "'" + text + "' is not a whole number" + (type == "N" ? "" : " of seconds") +
                " from " + std::to_string(range.first) + " to " + std::to_string(range.second);
     };
@@ -208,17 +201,15 @@ void declare_all(CLI::App &app, options &out) {
         {"Page", declare_page},    {"Catalogue", declare_catalogue}, {"Others", declare_help}};
     app.set_help_flag();
     for (const auto &[name, declare] : groups) {
+        app.option_defaults()->group(name);
         declare(app, out);
-        for (CLI::Option *option : app.get_options()) {
-            if (option->get_group() == "Options") option->group(name);
-        }
     }
     for (CLI::Option *option : app.get_options()) {
         option->description(wrapped(option->get_description()));
         if (option->get_items_expected_max() == 0) continue;  // a flag
         const bool is_file = option->get_positional();
         const auto check = [is_file](std::string &value) {
-            unshield(value);
+            if (value.size() > 1 && value[0] == kShield && value[1] == '[') value.erase(0, 1);
             // A file without a name is reported with the other files that cannot be read.
             return value.empty() && !is_file ? "the value is empty" : "";
         };
@@ -231,7 +222,7 @@ bool is_folder(const std::string &path) {
     return std::filesystem::is_directory(path, ignored);
 }
 
-// A combination of options that is not allowed, and the error sentence.
+// True if the options contradict each other, and the error sentence.
 using contradiction = std::pair<bool, std::string>;
 
 failure first_of(std::initializer_list<contradiction> table) {

@@ -1,4 +1,6 @@
-// The command line, parsed once. In: argc, argv. Out: options. Used by inputs.h, analyse_inputs.h.
+// Parses the command line once.
+//
+// Input: argc and argv. Output: options, which every part of the command reads.
 #ifndef TAVO_CLI_OPTIONS_H
 #define TAVO_CLI_OPTIONS_H
 
@@ -24,25 +26,25 @@ struct marker_format;  // write/markers.h
 
 struct options {
     int32_t mode = TAVO_MODE_BOTH;
-    int32_t length_s = 0;       // or 0
-    int32_t max_beats = 0;      // 0 for no limit
+    int32_t length_s = 0;       // requested length of the highlight, or 0
+    int32_t max_beats = 0;      // 0 means no limit
     int32_t max_minutes = 600;  // longer audio is refused
     result_format format = result_format::text;
-    const marker_format *markers = nullptr;  // of the format markers
-    std::string print;                       // template of the format print
+    const marker_format *markers = nullptr;  // set if `format` is markers
+    std::string print;                       // template of --print
     std::string click;                       // path of the click track, or empty
     std::string clip;                        // file or folder of the clips, or empty
-    double fade_s = 0.0;                     // at each end of a clip
+    double fade_s = 0.0;                     // fade at each end of a clip
     std::string report;                      // path of the page, or empty
     bool embed = false;                      // the page contains the sound
-    std::string output_dir;                  // of marker files; empty: beside each input
+    std::string output_dir;                  // folder of marker files; if empty, beside each input
     std::string fps = "30";                  // for formats that count frames, see markers.h
     bool force = false;
     bool skip_existing = false;
     bool quiet = false;
     std::string store;        // URL of the database, or empty
     bool from_store = false;  // writes the stored results and analyses nothing
-    bool failed = false;      // with from_store: failures instead of results
+    bool failed = false;      // with from_store: writes the failures, not the results
     bool retry_failed = false;
     bool redo = false;
     int32_t patience_s = 60;  // time to retry a database that does not respond
@@ -52,7 +54,7 @@ struct options {
     int32_t timeout_s = 0;            // limit for the analysis of one file, or 0
     bool normalize = false;           // refine coarse highlights in the amplified song
     std::string ffmpeg;               // path of the program, or empty
-    char list_separator = '\n';       // in lists of files
+    char list_separator = '\n';       // ends each name in a list
     std::vector<std::string> lists;   // lists of files; "-" is standard input
     std::vector<std::string> inputs;  // in order; "-" is a list on standard input
 };
@@ -60,9 +62,9 @@ struct options {
 constexpr int kExitOk = 0;
 constexpr int kExitFailed = 1;  // a file failed
 constexpr int kExitUsage = 2;
-constexpr int kExitSignal = 128;  // plus the signal that stopped the command
+constexpr int kExitSignal = 128;  // the number of the signal is added
 
-// Returns the exit status if the command is done already (help, version, wrong usage).
+// Returns an exit status if the command must end now: after help, the version or wrong usage.
 std::optional<int> parse_options(int argc, char **argv, options &out);
 
 // True if the only input is a file, not a folder or a list.

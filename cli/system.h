@@ -2,26 +2,54 @@
 #ifndef TAVO_CLI_SYSTEM_H
 #define TAVO_CLI_SYSTEM_H
 
+#include <sys/types.h>
+
+#include <climits>
 #include <csignal>
+#include <memory>
 #include <string>
 #include <string_view>
 
 // Closes fd and sets it to -1. Does nothing if fd is negative.
 void close_fd(int &fd);
 
-// True if a read returns immediately, with bytes or because the other end is closed. For a stop_fd
-// this means that a stop was requested.
+// True if a read would return immediately, with bytes or because the other end is closed. A
+// readable stop_fd means that a stop was requested.
 bool is_readable(int fd);
 
-// Writes all bytes and repeats interrupted calls. Returns 0 or errno.
+// Writes all bytes; continues after an interrupted call. Returns 0 or errno.
 int write_all(int fd, std::string_view bytes);
+
+using signal_handler = void (*)(int);
 
 // Installs a signal handler, without SA_RESTART, so that a blocked read returns. Returns the
 // previous handler.
-sighandler_t set_signal_handler(int number, sighandler_t handler);
+signal_handler set_signal_handler(int number, signal_handler handler);
 
-// Describes how a process ended, from the status of waitpid: "by signal 9 (Killed)" or "with status
-// 1".
+// Waits for a child process to end and sets pid to -1. Returns the status of waitpid.
+int wait_for_end(pid_t &pid);
+
+// Converts a status of waitpid to words: "by signal 9 (Killed)" or "with status 1".
 std::string ending_text(int status);
+
+// The name of the temporary file that a worker process is writing, in memory shared with the
+// command. If either process dies, the other one removes the file.
+struct temporary_file {
+    char path[PATH_MAX];  // empty if there is no file
+};
+
+// Returns null if memory runs out.
+std::shared_ptr<temporary_file> share_temporary_file();
+
+// Called in a worker. From then on, note_temporary_file stores its path in `file`, and a signal
+// removes the file and ends the worker. Returns the number of the signal.
+int remove_file_at_signal(temporary_file &file);
+
+// Stores the path of this worker's temporary file, or an empty path when it is gone. A worker has
+// at most one such file at a time. Does nothing in the command itself.
+void note_temporary_file(const std::string &path);
+
+// Removes the file, if there is one. Safe in a signal handler.
+void remove_file(temporary_file &file);
 
 #endif

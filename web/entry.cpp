@@ -45,7 +45,6 @@ void analyse_song(record &result, int32_t max_beats) {
         return;
     }
     tavo_get_stream(ctx, &result.sample_rate, &result.channels, &result.duration_ms);
-    result.has_stream = true;
     TAVO_INFO info{};
     tavo_set_listener(ctx, store_result, &info);
     // Here tavo_analyze returns after the job has ended; see threads.c.
@@ -65,7 +64,7 @@ void analyse_song(record &result, int32_t max_beats) {
 extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, int32_t max_beats,
                              int32_t channels) {
     fnamedec = "";
-    record result = failed_record(path, mode, "");
+    record result = {path, mode};
     result.sound_path = path;
     result.length_s = length_s;
     analyse_song(result, max_beats);
@@ -73,7 +72,7 @@ extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, i
     result_json out;
     if (result.status == outcome::ok) {
         if (const failure failed = read_song_view(result, -1, out["song"])) {
-            result = failed_record(path, mode, failed.sentence);
+            result = {path, mode, outcome::failed, failed.sentence};
             out.erase("song");
         }
     }

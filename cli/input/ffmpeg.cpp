@@ -1,121 +1,193 @@
 #include "cli/input/ffmpeg.h"
 
-#include <strings.h>
-#include <sys/mman.h>
-#include <sys/stat.h>
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/prctl.h>
+#include <sys/resource.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
+#include <chrono>
+#include <csignal>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <iterator>
+#include <sstream>
 
-#include "cli/input/ffmpeg_process.h"
 #include "cli/system.h"
+#include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
-#include "include/tavo.h"
 
 namespace {
 
-constexpr size_t kRateOffset = 24;                            // of a WAV header
-constexpr size_t kHeaderBytes = 44;                           // of ffmpeg's header without tags
-constexpr int64_t kMostWavBytes = (int64_t{1} << 32) - 4096;  // a WAV file has 32-bit sizes
+constexpr size_t kMostMessageBytes = 65536;  // only the first line is used
+// Limit on the address space. A damaged file can make ffmpeg allocate hours of silence at once.
+constexpr rlim_t kMostProgramBytes = rlim_t{448} << 20;
+constexpr int kReadPollMs = 1000;  // time between two checks of the clock
+constexpr int kEndPollMs = 10;     // time between two checks whether the program has ended
 
-// Limit on a file's decoded sound: one minute plus this many samples per byte. Silence has about a
-// thousand in the most compact codecs. Without the limit a wrong time stamp could add hours.
-constexpr int64_t kMostSamplesPerByte = 2048;
-constexpr int64_t kSpareSeconds = 60;
+// Containers that hold their own audio. Playlists and scripts (HLS, concat, DASH, SDP, image
+// sequences) refer to other files and are not accepted.
+constexpr const char *kContainers =
+    "aac,ac3,aiff,amr,amrnb,amrwb,ape,asf,au,avi,caf,dsf,dts,dtshd,eac3,flac,flv,iff,loas,matroska,"
+    "mlp,mov,mp3,"
+    "mpc,mpc8,mpeg,mpegts,mxf,nut,ogg,oma,rm,shn,sox,tak,truehd,tta,voc,w64,wav,wv,xwma";
 
-constexpr const char *kMediaSuffixes[] = {
-    ".3gp", ".ac3", ".aif", ".aifc", ".aiff", ".amr",  ".ape", ".au",   ".avi",
-    ".caf", ".dsf", ".dts", ".eac3", ".flv",  ".m2ts", ".m4a", ".m4b",  ".m4v",
-    ".mka", ".mkv", ".mov", ".mp4",  ".mpc",  ".mpeg", ".mpg", ".opus", ".spx",
-    ".tak", ".tta", ".voc", ".w64",  ".wav",  ".webm", ".wma", ".wmv",  ".wv"};
-
-// The output of one ffmpeg run.
-struct decoding {
-    int fd;              // destination
-    int64_t file_bytes;  // of the encoded file
-    int64_t most_minutes;
-    std::string header = {};  // first kHeaderBytes of the sound
-    int64_t bytes = 0;
-    int32_t rate = 0;  // Hz; 0 until the header is complete
+struct ffmpeg_process {
+    pid_t pid = -1;       // -1 after it was reaped
+    int sound_fd = -1;    // standard output
+    int message_fd = -1;  // standard error
+    std::string message;
 };
 
-int32_t read_rate(const std::string &header) {
-    uint32_t rate = 0;
-    for (size_t i = 4; i-- > 0;) rate = rate << 8 | static_cast<uint8_t>(header[kRateOffset + i]);
-    return static_cast<int32_t>(rate);
+using clock_type = std::chrono::steady_clock;
+
+// The prefix makes ffmpeg treat any name as a file: -x.mp3, http://x, a:b.mp3.
+std::string input_name(const ffmpeg_task &task) {
+    return "file:" + (task.fd >= 0 ? "/dev/stdin" : task.path);
 }
 
-failure cannot_hold(int code) {
-    return {system_sentence("The decoded sound cannot be held in memory", code)};
+std::vector<std::string> command_line(const ffmpeg_task &task) {
+    // One thread: by default there is one per core, and each reserves 72 MiB of address space.
+    std::vector<std::string> words = {task.program, "-nostdin", "-hide_banner", "-v", "error"};
+    words.insert(words.end(), {"-threads", "1", "-filter_threads", "1"});
+    words.insert(words.end(), {"-protocol_whitelist", "file", "-format_whitelist", kContainers});
+    words.insert(words.end(), {"-vn", "-sn", "-dn", "-i", input_name(task)});
+    words.insert(words.end(), task.arguments.begin(), task.arguments.end());
+    return words;
 }
 
-failure store_sound(decoding &sound, std::string_view part) {
-    if (const int code = write_all(sound.fd, part)) return cannot_hold(code);
-    sound.bytes += static_cast<int64_t>(part.size());
-    if (sound.rate == 0) {
-        sound.header += part.substr(0, kHeaderBytes - sound.header.size());
-        if (sound.header.size() < kHeaderBytes) return {};
-        sound.rate = read_rate(sound.header);
-        if (sound.rate < TAVO_MIN_RATE || sound.rate > TAVO_MAX_RATE) {
-            return {"ffmpeg decodes it at " + std::to_string(sound.rate) +
-                    " Hz, which is not read."};
+// Runs in the new process. Ctrl-C does not reach it, because it is in a process group of its own;
+// the worker decides when it stops.
+[[noreturn]] void become_ffmpeg(char *const *words, int input, int output, int messages,
+                                pid_t parent) {
+    setpgid(0, 0);
+    prctl(PR_SET_PDEATHSIG, SIGKILL);
+    if (getppid() != parent) _exit(EXIT_FAILURE);
+    const rlimit memory = {kMostProgramBytes, kMostProgramBytes};
+    setrlimit(RLIMIT_AS, &memory);
+    const bool ready = dup2(input, STDIN_FILENO) >= 0 && dup2(output, STDOUT_FILENO) >= 0 &&
+                       dup2(messages, STDERR_FILENO) >= 0;
+    syscall(SYS_close_range, STDERR_FILENO + 1, ~0U, 0);
+    if (ready) execv(words[0], words);
+    _exit(EXIT_FAILURE);
+}
+
+// Returns 0 or errno.
+int start_ffmpeg(const ffmpeg_task &task, ffmpeg_process &process) {
+    std::vector<std::string> words = command_line(task);
+    std::vector<char *> pointers(words.size() + 1, nullptr);
+    std::transform(words.begin(), words.end(), pointers.begin(),
+                   [](std::string &word) { return word.data(); });
+    int sound[2] = {-1, -1};
+    int messages[2] = {-1, -1};
+    int input =
+        task.fd >= 0 ? fcntl(task.fd, F_DUPFD_CLOEXEC, 0) : open("/dev/null", O_RDONLY | O_CLOEXEC);
+    const bool opened =
+        input >= 0 && pipe2(sound, O_CLOEXEC) == 0 && pipe2(messages, O_CLOEXEC) == 0;
+    const pid_t parent = getpid();
+    if (opened) process.pid = fork();
+    if (process.pid == 0) become_ffmpeg(pointers.data(), input, sound[1], messages[1], parent);
+    const int code = process.pid < 0 ? errno : 0;
+    for (int *fd : {&input, &sound[1], &messages[1]}) close_fd(*fd);
+    process.sound_fd = sound[0];
+    process.message_fd = messages[0];
+    return code;
+}
+
+// Reads the available bytes. Closes fd at the end of the pipe.
+std::string_view read_part(int &fd, std::array<char, 65536> &part) {
+    const ssize_t got = read(fd, part.data(), part.size());
+    if (got == 0 || (got < 0 && errno != EINTR)) close_fd(fd);
+    return {part.data(), static_cast<size_t>(std::max<ssize_t>(got, 0))};
+}
+
+// Reads both pipes until they end, then waits for the process to end and stores its status.
+failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink, int &status) {
+    std::array<char, 65536> part;
+    auto deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
+    while (process.pid >= 0) {
+        pollfd watched[] = {
+            {process.sound_fd, POLLIN, 0}, {process.message_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
+        const bool is_ending = process.sound_fd < 0 && process.message_fd < 0;
+        poll(watched, std::size(watched), is_ending ? kEndPollMs : kReadPollMs);
+        if (watched[2].revents != 0) return {"The analysis was stopped."};
+        if (clock_type::now() > deadline) {
+            return {"ffmpeg made no progress for " + std::to_string(kIdleSeconds) +
+                    " s and was ended."};
         }
-    }
-    const int64_t samples = sound.bytes / 2;
-    if (samples > sound.most_minutes * 60 * sound.rate || sound.bytes > kMostWavBytes) {
-        return {"The audio is longer than " +
-                count_text(static_cast<size_t>(sound.most_minutes), "minute") + "."};
-    }
-    if (samples / kMostSamplesPerByte >
-        sound.file_bytes + kSpareSeconds * sound.rate / kMostSamplesPerByte) {
-        return {"The audio is longer than a file of its size can hold."};
+        if (watched[1].revents != 0) {
+            const std::string_view text = read_part(process.message_fd, part);
+            if (process.message.size() < kMostMessageBytes) process.message += text;
+        }
+        if (watched[0].revents != 0) {
+            deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
+            if (failure failed = sink(read_part(process.sound_fd, part))) return failed;
+        }
+        if (is_ending && waitpid(process.pid, &status, WNOHANG) > 0) process.pid = -1;
     }
     return {};
 }
 
-// Without tags the header has a fixed size.
-std::vector<std::string> wav_output(const std::string &filter, int32_t rate) {
-    const std::string filters = kPlayerTimeFilter + filter;
-    std::vector<std::string> words = {"-map",      "0:a:0", "-af",       filters,         "-ac",
-                                      "1",         "-c:a",  "pcm_s16le", "-map_metadata", "-1",
-                                      "-bitexact", "-f",    "wav"};
-    if (rate > 0) words.insert(words.end(), {"-ar", std::to_string(rate)});
-    words.emplace_back("pipe:1");
-    return words;
+// Closes the pipes, and kills the process if it has not ended.
+void kill_ffmpeg(ffmpeg_process &process) {
+    close_fd(process.sound_fd);
+    close_fd(process.message_fd);
+    if (process.pid < 0) return;
+    kill(process.pid, SIGKILL);
+    wait_for_end(process.pid);
 }
 
-failure decode_once(const ffmpeg_task &task, int stop_fd, decoding &sound) {
-    if (ftruncate(sound.fd, 0) != 0 || lseek(sound.fd, 0, SEEK_SET) != 0) return cannot_hold(errno);
-    return run_ffmpeg(task, stop_fd,
-                      [&sound](std::string_view part) { return store_sound(sound, part); });
+// Returns the first line of the messages, without the module's address and the file's name.
+std::string first_line(const ffmpeg_task &task, const std::string &message) {
+    std::string line = message.substr(0, message.find('\n'));
+    const size_t module_end = line.find("] ");
+    if (!line.empty() && line.front() == '[' && module_end != std::string::npos) {
+        line.erase(0, module_end + 2);
+    }
+    const std::string name = input_name(task) + ": ";
+    if (line.compare(0, name.size(), name) == 0) line.erase(0, name.size());
+    while (!line.empty() && (line.back() == '.' || line.back() == ' ')) line.pop_back();
+    return shown(line);
+}
+
+failure explain_end(const ffmpeg_task &task, const std::string &message, int status) {
+    if (WIFSIGNALED(status)) return {"ffmpeg was ended " + ending_text(status) + "."};
+    const bool is_cut = message.find(strerror(EIO)) != std::string::npos;  // a bad sector
+    if (WEXITSTATUS(status) == 0 && !is_cut) return {};
+    const std::string line = first_line(task, message);
+    return {line.empty() ? "ffmpeg ended " + ending_text(status) + "." : "ffmpeg: " + line + "."};
 }
 
 }  // namespace
 
-failure decode_with_ffmpeg(const options &opts, const std::string &path, int fd,
-                           const std::string &filter, int stop_fd, int &sound_fd) {
-    sound_fd = memfd_create("sound", MFD_CLOEXEC);
-    if (sound_fd < 0) return cannot_hold(errno);
-    struct stat info {};
-    const int code = fd >= 0 ? fstat(fd, &info) : stat(path.c_str(), &info);
-    const decoding start = {sound_fd, code == 0 ? info.st_size : 0, opts.max_minutes};
-    decoding sound = start;
-    failure failed = decode_once({opts.ffmpeg, path, fd, wav_output(filter, 0)}, stop_fd, sound);
-    const int32_t accepted = std::clamp<int32_t>(sound.rate, TAVO_MIN_RATE, TAVO_MAX_RATE);
-    if (sound.rate > 0 && sound.rate != accepted) {
-        sound = start;
-        failed = decode_once({opts.ffmpeg, path, fd, wav_output(filter, accepted)}, stop_fd, sound);
+std::string find_ffmpeg() {
+    const char *variable = getenv("PATH");
+    std::istringstream folders(variable == nullptr ? "" : variable);
+    for (std::string folder; std::getline(folders, folder, ':');) {
+        const std::string path = folder + "/ffmpeg";
+        std::error_code ignored;
+        if (path.front() == '/' && access(path.c_str(), X_OK) == 0 &&
+            std::filesystem::is_regular_file(path, ignored)) {
+            return path;
+        }
     }
-    if (!failed && sound.rate == 0) failed = {"ffmpeg decodes nothing of it."};
-    if (failed) close_fd(sound_fd);
-    return failed;
+    return "";
 }
 
-bool has_media_suffix(const std::string &name) {
-    return std::any_of(
-        std::begin(kMediaSuffixes), std::end(kMediaSuffixes), [&name](const std::string &suffix) {
-            return name.size() > suffix.size() &&
-                   strcasecmp(name.c_str() + name.size() - suffix.size(), suffix.c_str()) == 0;
-        });
+failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink) {
+    ffmpeg_process process;
+    int status = 0;
+    const int code = start_ffmpeg(task, process);
+    failure failed;
+    if (code != 0) failed = {system_sentence("ffmpeg could not be started", code)};
+    if (!failed) failed = read_pipes(process, stop_fd, sink, status);
+    if (!failed) failed = explain_end(task, process.message, status);
+    kill_ffmpeg(process);
+    return failed;
 }

@@ -1,22 +1,39 @@
-// Uses the ffmpeg program to decode files that the library refuses.
+// Runs the ffmpeg program on one file, which is not trusted.
 //
-// In: a file. Out: a WAV file in memory for the library: 16-bit mono, at the file's own rate or
-// the nearest supported one, on a player's timeline. Called by song_file.h.
+// Input: a file and the arguments for the output. Output: the bytes that the program writes to its
+// standard output. Used by song_file.h and write/clip.h in a worker process.
 #ifndef TAVO_CLI_INPUT_FFMPEG_H
 #define TAVO_CLI_INPUT_FFMPEG_H
 
+#include <cstddef>
+#include <functional>
 #include <string>
+#include <string_view>
+#include <vector>
 
 #include "cli/failure.h"
-#include "cli/options.h"
 
-// Decodes the first audio stream of `fd`, or of `path` if `fd` is negative. sound_fd receives a new
-// descriptor, which the caller closes; -1 after a failure.
-failure decode_with_ffmpeg(const options &opts, const std::string &path, int fd,
-                           const std::string &filter, int stop_fd, int &sound_fd);
+struct ffmpeg_task {
+    std::string program;                 // path of ffmpeg
+    std::string path;                    // of the file to read, any bytes except NUL
+    int fd = -1;                         // if not negative, this seekable file is read instead
+    std::vector<std::string> arguments;  // everything after the input
+};
 
-// True if a file's name has the extension of a format that ffmpeg reads and the library does not.
-// In a folder such files count as audio if ffmpeg is installed, whatever they contain.
-bool has_media_suffix(const std::string &name);
+// Receives the program's standard output. A failure ends the program.
+using byte_sink = std::function<failure(std::string_view bytes)>;
+
+// Searches PATH. Returns the path of the ffmpeg program, or an empty string.
+std::string find_ffmpeg();
+
+// Runs the program and waits until it has ended. It is killed if stop_fd becomes readable or if
+// it writes nothing for kIdleSeconds. It can read only the given file, and nothing from the
+// network. A failure quotes the first line of the program's messages.
+failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink);
+
+constexpr int kIdleSeconds = 30;
+
+// Starts the timeline at 0 and fills gaps with silence, as players do.
+constexpr const char *kPlayerTimeFilter = "aresample=async=1:first_pts=0";
 
 #endif

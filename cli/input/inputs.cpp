@@ -1,18 +1,23 @@
 #include "cli/input/inputs.h"
 
+#include <fcntl.h>
+#include <strings.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
+#include <climits>
 #include <filesystem>
 #include <functional>
 #include <iterator>
 #include <optional>
 #include <utility>
 
-#include "cli/input/ffmpeg.h"
 #include "cli/input/recognise.h"
 #include "cli/input/song_file.h"
+#include "cli/system.h"
 #include "cli/write/clip.h"
 #include "cli/write/file_names.h"
 #include "cli/write/markers.h"
@@ -20,6 +25,17 @@
 #include "include/tavo.h"
 
 namespace {
+
+constexpr size_t kMostNameBytes = PATH_MAX;  // longer paths cannot be opened
+constexpr const char *kByteOrderMark = "\xEF\xBB\xBF";
+
+// Extensions of formats and containers that ffmpeg reads and the library may not. In a folder,
+// files with these extensions count as audio if ffmpeg is installed, whatever they contain.
+constexpr const char *kMediaSuffixes[] = {
+    ".3gp", ".ac3", ".aif", ".aifc", ".aiff", ".amr",  ".ape", ".au",   ".avi",
+    ".caf", ".dsf", ".dts", ".eac3", ".flv",  ".m2ts", ".m4a", ".m4b",  ".m4v",
+    ".mka", ".mkv", ".mov", ".mp4",  ".mpc",  ".mpeg", ".mpg", ".opus", ".spx",
+    ".tak", ".tta", ".voc", ".w64",  ".wav",  ".webm", ".wma", ".wmv",  ".wv"};
 
 void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
@@ -32,21 +48,21 @@ file_id id_of(const struct stat &info) {
 // Claims the marker file or clip of an input, so that no other input writes the same file. Returns
 // false if the input is to be skipped.
 bool claim_target(input_supply &supply, input &entry, const std::string &target) {
-    const std::string name = base_name(target);
-    struct stat info {};
-    if (supply.opts.skip_existing && lstat(target.c_str(), &info) == 0) {
+    struct stat file {};
+    struct stat folder {};
+    if (supply.opts.skip_existing && lstat(target.c_str(), &file) == 0) {
         ++supply.existing;
         return false;
     }
-    if (stat((target.substr(0, target.size() - name.size()) + ".").c_str(), &info) != 0) {
-        return true;  // a failure is reported when the file is written
+    const std::string name = base_name(target);
+    const std::string folder_path = target.substr(0, target.size() - name.size()) + ".";
+    if (stat(folder_path.c_str(), &folder) != 0 || stat(entry.path.c_str(), &file) != 0) {
+        return true;  // a failure is reported when the file is read or written
     }
-    const std::string key =
-        std::to_string(info.st_dev) + "/" + std::to_string(info.st_ino) + "/" + name;
-    if (stat(entry.path.c_str(), &info) != 0) return true;
-    const auto [claim, is_first] = supply.targets.emplace(key, id_of(info));
+    const auto [claim, is_first] =
+        supply.targets.emplace(std::pair(id_of(folder), name), id_of(file));
     if (is_first) return true;
-    if (claim->second == id_of(info)) {
+    if (claim->second == id_of(file)) {
         add_note(supply, shown(entry.path) + ": named more than once, done once.");
         return false;
     }
@@ -101,8 +117,12 @@ bool is_audio(const std::string &path, const options &opts, failure &refusal) {
         return code == EACCES || code == EPERM || code == EIO;
     }
     if (kind != file_kind::unknown) return true;
-    if (!opts.ffmpeg.empty() && has_media_suffix(path)) return true;
-    // The library also finds MPEG audio after other bytes.
+    const std::string suffix = std::filesystem::path(path).extension();
+    const auto is_suffix = [&](const char *s) { return strcasecmp(suffix.c_str(), s) == 0; };
+    const bool may_hold_audio =
+        std::any_of(std::begin(kMediaSuffixes), std::end(kMediaSuffixes), is_suffix);
+    if (may_hold_audio && !opts.ffmpeg.empty()) return true;
+    // The library also finds MPEG audio that follows other bytes.
     song_file song;
     if (open_song(path, -1, song)) return false;
     const int32_t probed = tavo_probe(song.path.c_str(), nullptr);
@@ -110,80 +130,147 @@ bool is_audio(const std::string &path, const options &opts, failure &refusal) {
     return probed != TAVO_ERR_FORMAT && probed != TAVO_ERR_READ;
 }
 
-// Each function below examines one name and returns true if it found an input.
+failure cannot_read_list(int code) {
+    return {system_sentence("The list of files cannot be read", code)};
+}
 
-bool look_at_entry(input_supply &supply, input &out) {
-    if (supply.entries.empty()) return leave_folder(supply, out);
+// Refuses a song that was passed as a list by mistake, because it would yield thousands of names.
+failure check_start(const name_list &list, char separator) {
+    const file_kind kind = recognise_bytes(list.text);
+    if (kind != file_kind::unknown) {
+        const std::string subject = list.name == "-" ? "Standard input" : "The list";
+        return {subject + " holds sound (" + kind_name(kind) + "), not a list of names; " +
+                (list.name == "-" ? "save it to a file first." : "name it as FILE.")};
+    }
+    if (separator != '\0' && list.text.find('\0') != std::string::npos) {
+        return {"The list holds NUL bytes: give -0 when its names end with them."};
+    }
+    return {};
+}
+
+bool is_comment(const std::string &line) {
+    struct stat info {};
+    return line[0] == '#' && lstat(line.c_str(), &info) != 0;
+}
+
+// Removes the next line from the text and returns it. Returns nothing if its separator has not
+// arrived, unless the list has ended.
+std::optional<std::string> read_line(name_list &list, char separator) {
+    const size_t end = list.text.find(separator);
+    if (end == std::string::npos && (!list.ended || list.text.empty())) return std::nullopt;
+    std::string line = list.text.substr(0, end);
+    list.text.erase(0, end == std::string::npos ? end : end + 1);
+    if (separator == '\n' && !line.empty() && line.back() == '\r') line.pop_back();
+    return line;
+}
+
+// Reads the next name. If it returns no name, the list has ended, or more may follow once its
+// descriptor is readable. Never waits. A list with one name per line may be an M3U playlist, so
+// comments and carriage returns at line ends are removed.
+failure read_name(name_list &list, char separator, std::optional<std::string> &name) {
+    while (true) {
+        if (!list.begun && !list.text.empty()) {
+            list.begun = true;
+            if (failure failed = check_start(list, separator)) return failed;
+            if (list.text.compare(0, 3, kByteOrderMark) == 0) list.text.erase(0, 3);
+        }
+        while ((name = read_line(list, separator))) {
+            if (name->empty() || (separator == '\n' && is_comment(*name))) continue;
+            ++list.names;
+            return {};
+        }
+        if (list.text.size() > kMostNameBytes) {
+            return {"The list holds a name of more than " + std::to_string(kMostNameBytes) +
+                    " bytes; is it a list of names?"};
+        }
+        if (list.ended || !is_readable(list.fd)) return {};
+        std::array<char, 65536> part;
+        const ssize_t got = read(list.fd, part.data(), part.size());
+        if (got < 0 && errno != EINTR && errno != EAGAIN) return cannot_read_list(errno);
+        list.ended = got == 0;
+        if (got > 0) list.text.append(part.data(), static_cast<size_t>(got));
+    }
+}
+
+supply_state ready_if(bool is_input) {
+    return is_input ? supply_state::ready : supply_state::searching;
+}
+
+// Each function below examines one name and stores it in `out`. Returns ready if it is an input.
+
+supply_state look_at_entry(input_supply &supply, input &out) {
+    if (supply.entries.empty()) return ready_if(leave_folder(supply, out));
     out = {std::move(supply.entries.back()), {}};
     supply.entries.pop_back();
     struct stat info {};
-    if (stat(out.path.c_str(), &info) != 0) return false;
-    bool is_found = false;
+    if (stat(out.path.c_str(), &info) != 0) return supply_state::searching;
+    bool is_input = false;
     if (S_ISDIR(info.st_mode) && supply.opts.recursive) {
         out.refusal = enter_folder(supply, out.path, info);
-        is_found = static_cast<bool>(out.refusal);
+        is_input = static_cast<bool>(out.refusal);
     } else if (S_ISREG(info.st_mode)) {
-        is_found = is_audio(out.path, supply.opts, out.refusal);
-        if (!is_found) ++supply.skipped;
+        is_input = is_audio(out.path, supply.opts, out.refusal);
+        if (!is_input) ++supply.skipped;
     }
-    if (is_found) ++supply.found;
-    return is_found;
+    if (is_input) ++supply.found;
+    return ready_if(is_input);
 }
 
-bool look_at_path(input_supply &supply, const std::string &path, input &out) {
+supply_state look_at_path(input_supply &supply, const std::string &path, input &out) {
     out = {path, {}};
     struct stat info {};
-    if (stat(path.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) return true;
+    if (stat(path.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) return supply_state::ready;
     supply.found = supply.skipped = 0;
     supply.searched.clear();
     out.refusal = enter_folder(supply, path, info);
-    if (!out.refusal) supply.folder = path;
-    return static_cast<bool>(out.refusal);
+    if (out.refusal) return supply_state::ready;
+    supply.folder = path;
+    return supply_state::searching;
 }
 
-bool look_at_list(input_supply &supply, input &out) {
-    list_reader &list = supply.list;
+supply_state look_at_list(input_supply &supply, input &out) {
+    name_list &list = supply.list;
     std::optional<std::string> name;
-    out = {list.name, read_name(list, name)};
+    out = {list.name, read_name(list, supply.opts.list_separator, name)};
     if (name) return look_at_path(supply, *name, out);
-    if (!out.refusal && !list.ended) return false;
+    if (!out.refusal && !list.ended) return supply_state::waiting;
     if (!out.refusal && list.names == 0) {
-        add_note(supply, (list.name == "-" ? "the list on standard input"
-                                           : "the list " + shown(list.name)) +
+        const bool is_file = list.name != "-";
+        add_note(supply, (is_file ? "the list " + shown(list.name) : "the list on standard input") +
                              " names no files.");
     }
-    close_list(list);
-    return static_cast<bool>(out.refusal);
+    if (list.fd != STDIN_FILENO) close(list.fd);
+    list.fd = -1;
+    return ready_if(static_cast<bool>(out.refusal));
 }
 
-bool look_at_argument(input_supply &supply, input &out) {
+supply_state look_at_argument(input_supply &supply, input &out) {
     const options &opts = supply.opts;
     const size_t index = supply.argument++;
     const bool is_file = index < opts.inputs.size();
     const std::string &word = is_file ? opts.inputs[index] : opts.lists[index - opts.inputs.size()];
     if (is_file && word != "-") return look_at_path(supply, word, out);
-    out = {word, open_list(supply.list, word, opts.list_separator)};
-    return static_cast<bool>(out.refusal);
+    supply.list = {word, word == "-" ? STDIN_FILENO : open(word.c_str(), O_RDONLY | O_CLOEXEC)};
+    out = {word, supply.list.fd >= 0 ? failure() : cannot_read_list(errno)};
+    return ready_if(supply.list.fd < 0);
+}
+
+supply_state look_at_next(input_supply &supply, input &out) {
+    if (!supply.folder.empty()) return look_at_entry(supply, out);
+    if (supply.list.fd >= 0) return look_at_list(supply, out);
+    const size_t arguments = supply.opts.inputs.size() + supply.opts.lists.size();
+    if (supply.argument < arguments) return look_at_argument(supply, out);
+    if (supply.existing > 0) {
+        add_note(supply, count_text(supply.existing, "input") + " left out: the file is there.");
+    }
+    return supply_state::ended;
 }
 
 }  // namespace
 
 supply_state next_input(input_supply &supply, input &out) {
-    const options &opts = supply.opts;
-    const bool is_search = !supply.folder.empty();
-    const bool is_list = !is_search && supply.list.fd >= 0;
-    if (!is_search && !is_list && supply.argument == opts.inputs.size() + opts.lists.size()) {
-        if (supply.existing > 0) {
-            add_note(supply,
-                     count_text(supply.existing, "input") + " left out: the file is there.");
-            supply.existing = 0;
-        }
-        return supply_state::ended;
-    }
-    const bool is_found = is_search ? look_at_entry(supply, out)
-                          : is_list ? look_at_list(supply, out)
-                                    : look_at_argument(supply, out);
-    if (is_found && (out.refusal || claim_targets(supply, out))) return supply_state::ready;
-    const bool is_waiting = is_list && !is_found && supply.folder.empty() && supply.list.fd >= 0;
-    return is_waiting ? supply_state::waiting : supply_state::searching;
+    const supply_state state = look_at_next(supply, out);
+    const bool is_input = state == supply_state::ready;
+    const bool is_skipped = is_input && !out.refusal && !claim_targets(supply, out);
+    return is_skipped ? supply_state::searching : state;
 }

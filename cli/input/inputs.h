@@ -1,19 +1,19 @@
 // Finds the files to analyse, one at a time, in the order of the command line.
 //
-// In: options (files, folders, lists). Out: one input per file. Used by analyse_inputs.h.
+// Input: the files, folders and lists in the options. Output: one input per file. Used by
+// run/analyse_inputs.h.
 #ifndef TAVO_CLI_INPUT_INPUTS_H
 #define TAVO_CLI_INPUT_INPUTS_H
 
 #include <sys/types.h>
 
+#include <map>
 #include <set>
 #include <string>
-#include <unordered_map>
 #include <utility>
 #include <vector>
 
 #include "cli/failure.h"
-#include "cli/input/list_reader.h"
 #include "cli/options.h"
 
 struct input {
@@ -21,20 +21,31 @@ struct input {
     failure refusal;   // set if the input is already known to be unusable
 };
 
+// A list of names that is read as it arrives: from a file, a pipe or a terminal.
+struct name_list {
+    std::string name = {};  // name of the list; "-" is standard input
+    int fd = -1;            // -1 if no list is being read
+    std::string text = {};  // text that was read and not yet returned
+    size_t names = 0;       // number of names returned
+    bool begun = false;     // the start of the text has been checked
+    bool ended = false;     // the end of the list has been read
+};
+
 using file_id = std::pair<dev_t, ino_t>;
 
 struct input_supply {
     const options &opts;
     size_t argument = 0;                    // next index in opts.inputs, then in opts.lists
-    list_reader list = {};                  // list that is being read
+    name_list list = {};                    // list that is being read
     std::string folder = {};                // folder that is being searched, or empty
-    std::vector<std::string> entries = {};  // of folder, not yet examined, in reverse order
-    std::set<file_id> searched = {};        // folder and the folders entered in it
-    size_t found = 0;                       // audio files in it
-    size_t skipped = 0;                     // other files in it
+    std::vector<std::string> entries = {};  // entries of the folder not yet examined, last first
+    std::set<file_id> searched = {};        // the folder and those entered in it
+    size_t found = 0;                       // audio files found in the folder
+    size_t skipped = 0;                     // other files found in the folder
     size_t existing = 0;                    // inputs left out by --skip-existing
-    std::unordered_map<std::string, file_id> targets = {};  // marker files and their inputs
-    std::string notes = {};                                 // lines for standard error
+    // Folder and name of each marker file or clip, with the input that it belongs to.
+    std::map<std::pair<file_id, std::string>, file_id> targets = {};
+    std::string notes = {};  // lines for standard error
 };
 
 enum class supply_state {
@@ -49,9 +60,9 @@ enum class supply_state {
 // Folders are searched for audio files, which are recognised by content, not by name; refused
 // formats count as audio, so that they are reported. With --recursive the folders inside, including
 // linked ones, are searched too, each once. A file or folder that cannot be read becomes an input
-// with a refusal, and so does a folder without audio. If the format writes files, no two inputs get
-// the same one. Memory grows with the folders of a search and the marker files, but not with a
-// list.
+// with a refusal, and so does a folder without audio. If each
+// input has a marker file or a clip, no two inputs get the same one. Memory grows with the folders
+// that are searched and the files that will be written, but not with the length of a list.
 supply_state next_input(input_supply &supply, input &out);
 
 #endif

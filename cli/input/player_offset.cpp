@@ -13,8 +13,8 @@ constexpr int64_t kDecoderDelay = 529;  // samples, in every Layer III decoder
 constexpr int32_t kDropRate = 44'100;   // Hz; at this rate the library drops that delay in stereo
 constexpr int64_t kLayer1Samples = 384;
 
-// Returns the samples that players drop according to the LAME header; 0 without such a header.
-// frame: bytes of the file from the first compressed frame on.
+// Returns how many samples players drop according to the LAME header; 0 if there is none. `frame`
+// starts with the first compressed frame.
 int64_t samples_dropped(std::string_view frame) {
     const auto byte = [&](size_t i) { return static_cast<uint8_t>(frame[i]); };
     const bool is_mpeg1 = (byte(1) >> 3 & 3) == 3;
@@ -52,28 +52,22 @@ double mpeg_offset_ms(const std::string &path, int32_t rate, int32_t channels) {
     return 1000.0 * static_cast<double>(dropped) / rate;
 }
 
-// A box of an MP4 file.
-struct box {
-    std::string_view type;  // empty if there is no box
-    std::string_view content;
-};
-
-// Removes the first box and returns it. Removes all boxes if they are damaged.
-box read_box(std::string_view &boxes) {
-    const uint64_t size = big_endian(boxes, 0, 4);
-    box first;
-    if (size >= 8 && size <= boxes.size()) first = {boxes.substr(4, 4), boxes.substr(8, size - 8)};
-    boxes.remove_prefix(first.type.empty() ? boxes.size() : size);
-    return first;
+// Returns the content of the first box of this type, and removes the boxes up to its end. If there
+// is no such box, or a box before it is damaged, returns nothing and removes all boxes.
+std::string_view next_box(std::string_view &boxes, std::string_view type) {
+    while (!boxes.empty()) {
+        const uint64_t size = big_endian(boxes, 0, 4);
+        if (size < 8 || size > boxes.size()) break;
+        const std::string_view first = boxes.substr(0, size);
+        boxes.remove_prefix(size);
+        if (first.substr(4, 4) == type) return first.substr(8);
+    }
+    boxes = {};
+    return {};
 }
 
-// Content of the first box of this type, or empty.
 std::string_view find_box(std::string_view boxes, std::string_view type) {
-    while (!boxes.empty()) {
-        const box next = read_box(boxes);
-        if (next.type == type) return next.content;
-    }
-    return {};
+    return next_box(boxes, type);
 }
 
 // Returns the content of the movie box, or an empty string.
@@ -140,10 +134,10 @@ double mp4_offset_ms(const std::string &path, int32_t rate) {
     const double movie_scale = time_scale(find_box(movie, "mvhd"));
     const double tag_ms = tag_offset_ms(movie, rate);
     for (std::string_view boxes = movie; !boxes.empty();) {
-        const box track = read_box(boxes);
-        const std::string_view media = find_box(track.content, "mdia");
-        if (track.type != "trak" || big_endian(find_box(media, "hdlr"), 8, 4) != kSound) continue;
-        const std::string_view edits = find_box(find_box(track.content, "edts"), "elst");
+        const std::string_view track = next_box(boxes, "trak");
+        const std::string_view media = find_box(track, "mdia");
+        if (big_endian(find_box(media, "hdlr"), 8, 4) != kSound) continue;
+        const std::string_view edits = find_box(find_box(track, "edts"), "elst");
         double ms = 0.0;
         if (!read_edits(edits, movie_scale, time_scale(find_box(media, "mdhd")), ms)) break;
         return tag_ms > 0.0 ? std::max(ms, tag_ms) : ms;  // players apply the longer one

@@ -1,8 +1,8 @@
-// Recognises audio by the first bytes of a file, whatever its name, and names the format for
-// messages. The library decides whether the file can be analysed.
+// Recognises audio by the first bytes of a file, whatever its name, and explains why the library
+// cannot use a file. The library alone decides whether it can.
 //
-// Input: a path or bytes. Output: a file_kind. Used by inputs.h, list_reader.h, explain.h and
-// report/report.h; player_offset.h also uses the functions that read bytes.
+// Input: a path or bytes. Output: a file_kind, or a sentence. Used by inputs.h, song_file.h,
+// run/analyse.h and report/report.h; player_offset.h uses the functions that read bytes.
 #ifndef TAVO_CLI_INPUT_RECOGNISE_H
 #define TAVO_CLI_INPUT_RECOGNISE_H
 
@@ -10,18 +10,10 @@
 #include <string>
 #include <string_view>
 
-enum class file_kind {
-    unknown,
-    wav,
-    aiff,
-    flac,
-    ogg,
-    mp4,
-    aac,
-    mpeg,  // Layers I to III, "MP3"
-    asf,
-    matroska,
-};
+#include "include/tavo.h"
+
+// mpeg: MPEG audio, Layers I to III, which messages call MP3.
+enum class file_kind { unknown, wav, aiff, flac, ogg, mp4, aac, mpeg, asf, matroska };
 
 constexpr size_t kKindBytes = 16;  // needed by recognise_bytes
 
@@ -46,5 +38,12 @@ uint64_t big_endian(std::string_view bytes, size_t offset, size_t size);
 // Returns the offset of the first byte after the ID3v2 tags at the start of the file; 0 if the file
 // has no such tag.
 int64_t find_id3v2_end(const std::string &path, int &code);
+
+// Returns the reason why the library refused a file: `code` is TAVO_ERR_MEMORY or the result of
+// tavo_probe, which stored `stream`. Reads the file to find errors that the library does not name.
+std::string explain_refusal(const std::string &path, int32_t code, const TAVO_STREAM &stream);
+
+// Returns the reason why an analysis received no audio or, with has_audio, only a part of it.
+std::string explain_lost_audio(const std::string &path, bool has_audio);
 
 #endif

@@ -3,19 +3,10 @@
 #include <algorithm>
 #include <charconv>
 #include <cstdlib>
-#include <optional>
-#include <string_view>
 
 namespace {
 
 using number = std::optional<int64_t>;
-
-number read_number(std::string_view text) {
-    int64_t value = 0;
-    const char *end = text.data() + text.size();
-    const auto [stop, error] = std::from_chars(text.data(), end, value);
-    return error == std::errc() && stop == end ? number(value) : std::nullopt;
-}
 
 number read_environment(const char *name) {
     const char *text = getenv(name);
@@ -38,6 +29,13 @@ void read_engine(number &index, number &count) {
 }
 
 }  // namespace
+
+number read_number(std::string_view text) {
+    int64_t value = 0;
+    const char *end = text.data() + text.size();
+    const auto [stop, error] = std::from_chars(text.data(), end, value);
+    return error == std::errc() && stop == end ? number(value) : std::nullopt;
+}
 
 failure read_shard(const std::string &words, shard &out) {
     number index;

@@ -3,7 +3,9 @@
 #define TAVO_CLI_INPUT_SHARD_H
 
 #include <cstdint>
+#include <optional>
 #include <string>
+#include <string_view>
 
 #include "cli/failure.h"
 
@@ -12,13 +14,16 @@ struct shard {
     int64_t count = 1;
 };
 
-// Parses "I/N" with I from 1 to N, or "auto", which reads the environment of a Slurm array
+// Returns the whole number that the text consists of; nothing for any other text.
+std::optional<int64_t> read_number(std::string_view text);
+
+// Parses "I/N", with I from 1 to N, or "auto", which reads the environment of a Slurm array
 // (SLURM_ARRAY_TASK_*), a Kubernetes indexed job (JOB_COMPLETION_INDEX) or an AWS Batch array
 // (AWS_BATCH_JOB_ARRAY_*). If the scheduler does not state N, TAVO_SHARDS must.
 failure read_shard(const std::string &words, shard &out);
 
-// True if the file belongs to the part. Determined by a hash of the path's bytes that is the same
-// on every machine.
+// True if the file belongs to the part. A hash of the path's bytes decides, which is the same on
+// every machine.
 bool in_shard(const shard &of, const std::string &path);
 
 #endif

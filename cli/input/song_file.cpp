@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <charconv>
@@ -20,6 +21,15 @@
 namespace {
 
 constexpr off_t kMostPipeBytes = off_t{4} << 30;  // memory for data from a pipe
+
+constexpr off_t kRateOffset = 24;                             // of a WAV header
+constexpr int64_t kHeaderBytes = 44;                          // of ffmpeg's header without tags
+constexpr int64_t kMostWavBytes = (int64_t{1} << 32) - 4096;  // a WAV file has 32-bit sizes
+
+// Limit on a file's decoded sound: one minute plus this many samples per byte. Silence has about a
+// thousand in the most compact codecs. Without the limit a wrong time stamp could add hours.
+constexpr int64_t kMostSamplesPerByte = 2048;
+constexpr int64_t kSpareSeconds = 60;
 
 // Returns the descriptor that a path such as /dev/stdin refers to, or -1.
 int named_descriptor(const std::string &path) {
@@ -94,6 +104,85 @@ failure check_file(const std::string &path) {
     return {"The file is too short to be audio: it has " + std::to_string(size) + " bytes."};
 }
 
+// The output of one ffmpeg run.
+struct decoding {
+    int fd = -1;             // destination
+    int64_t file_bytes = 0;  // of the encoded file
+    int64_t most_minutes = 0;
+    int64_t bytes = 0;
+    int32_t rate = 0;  // Hz; 0 until the header is complete
+};
+
+failure cannot_hold(int code) {
+    return {system_sentence("The decoded sound cannot be held in memory", code)};
+}
+
+failure store_sound(decoding &sound, std::string_view part) {
+    if (const int code = write_all(sound.fd, part)) return cannot_hold(code);
+    sound.bytes += static_cast<int64_t>(part.size());
+    if (sound.rate == 0) {
+        if (sound.bytes < kHeaderBytes) return {};
+        // The field is little-endian, as is every processor that the command runs on.
+        if (pread(sound.fd, &sound.rate, sizeof sound.rate, kRateOffset) < 0) {
+            return cannot_hold(errno);
+        }
+        if (sound.rate < TAVO_MIN_RATE || sound.rate > TAVO_MAX_RATE) {
+            return {"ffmpeg decodes it at " + std::to_string(sound.rate) +
+                    " Hz, which is not read."};
+        }
+    }
+    const int64_t samples = sound.bytes / 2;
+    if (samples > sound.most_minutes * 60 * sound.rate || sound.bytes > kMostWavBytes) {
+        return {"The audio is longer than " +
+                count_text(static_cast<size_t>(sound.most_minutes), "minute") + "."};
+    }
+    if (samples / kMostSamplesPerByte >
+        sound.file_bytes + kSpareSeconds * sound.rate / kMostSamplesPerByte) {
+        return {"The audio is longer than a file of its size can hold."};
+    }
+    return {};
+}
+
+// Decodes the first audio stream of source_fd, or of `path` if source_fd is negative, to a WAV file
+// in memory: one channel of 16 bits, at the stream's own rate or the nearest supported one, on the
+// timeline of players.
+failure decode(const std::string &path, const options &opts, int stop_fd, int source_fd,
+               const std::string &filter, song_file &song) {
+    decoding sound;
+    sound.fd = memfd_create("sound", MFD_CLOEXEC);
+    if (sound.fd < 0) return cannot_hold(errno);
+    struct stat info {};
+    const int code = source_fd >= 0 ? fstat(source_fd, &info) : stat(path.c_str(), &info);
+    sound.file_bytes = code == 0 ? info.st_size : 0;
+    sound.most_minutes = opts.max_minutes;
+    ffmpeg_task task = {opts.ffmpeg, path, source_fd, {}};
+    task.arguments = {"-map", "0:a:0", "-af", kPlayerTimeFilter + filter, "-ac", "1"};
+    // Without tags the header has a fixed size.
+    const auto format = {"-c:a", "pcm_s16le", "-map_metadata", "-1", "-bitexact", "-f", "wav"};
+    task.arguments.insert(task.arguments.end(), format.begin(), format.end());
+    task.arguments.emplace_back("pipe:1");
+    const auto run = [&]() -> failure {
+        sound.bytes = sound.rate = 0;
+        if (ftruncate(sound.fd, 0) != 0) return cannot_hold(errno);
+        lseek(sound.fd, 0, SEEK_SET);
+        return run_ffmpeg(task, stop_fd,
+                          [&](std::string_view part) { return store_sound(sound, part); });
+    };
+    failure failed = run();
+    const int32_t accepted = std::clamp<int32_t>(sound.rate, TAVO_MIN_RATE, TAVO_MAX_RATE);
+    if (sound.rate > 0 && sound.rate != accepted) {
+        task.arguments.insert(task.arguments.begin(), {"-ar", std::to_string(accepted)});
+        failed = run();
+    }
+    if (!failed && sound.rate == 0) failed = {"ffmpeg decodes nothing of it."};
+    if (failed) {
+        close_fd(sound.fd);
+    } else {
+        song = song_at(sound.fd, source_fd, true);
+    }
+    return failed;
+}
+
 }  // namespace
 
 failure open_song(const std::string &path, int stop_fd, song_file &song) {
@@ -112,10 +201,7 @@ failure decode_song(const std::string &path, const options &opts, int stop_fd, s
     if (opts.ffmpeg.empty()) {
         return {"ffmpeg, which may read it, is not installed or is switched off."};
     }
-    int sound_fd = -1;
-    const failure failed = decode_with_ffmpeg(opts, path, song.fd, "", stop_fd, sound_fd);
-    if (!failed) song = song_at(sound_fd, song.fd, true);
-    return failed;
+    return decode(path, opts, stop_fd, song.fd, "", song);
 }
 
 failure raise_song(const std::string &path, const options &opts, int stop_fd, const song_file &song,
@@ -128,9 +214,9 @@ failure raise_song(const std::string &path, const options &opts, int stop_fd, co
     filter += ",volume=" + std::to_string(gain) + ":precision=double";
     if (offset_ms > 0.0) filter += ",adelay=" + std::to_string(offset_ms) + ":all=1";
     if (offset_ms < 0.0) filter += ",atrim=start=" + std::to_string(-offset_ms / 1000.0);
-    int fd = song.by_ffmpeg ? song.source_fd : song.fd;
-    const failure failed = decode_with_ffmpeg(opts, path, fd, filter, stop_fd, fd);
-    if (!failed) raised = song_at(fd, -1, true);
+    const int source_fd = song.by_ffmpeg ? song.source_fd : song.fd;
+    const failure failed = decode(path, opts, stop_fd, source_fd, filter, raised);
+    raised.source_fd = -1;  // it belongs to `song`
     return failed;
 }
 

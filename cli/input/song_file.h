@@ -1,7 +1,8 @@
 // A song in a form that the library can open: the file itself, the contents of a pipe, or the
 // output of ffmpeg.
 //
-// In: a path of the command line. Out: a path for the library. Called by run/analyse.h.
+// Input: a path that the user named. Output: a path for the library. Used by inputs.h and the
+// worker's files in run/.
 #ifndef TAVO_CLI_INPUT_SONG_FILE_H
 #define TAVO_CLI_INPUT_SONG_FILE_H
 
@@ -12,8 +13,8 @@
 
 struct song_file {
     std::string path;        // for the library; valid at least until close_song
-    int fd = -1;             // kept open for path, or -1
-    int source_fd = -1;      // source of the sound that ffmpeg decoded, or -1 if it is a file
+    int fd = -1;             // stays open as long as path is used; or -1
+    int source_fd = -1;      // what ffmpeg decoded, or -1 if it is the file itself
     bool by_ffmpeg = false;  // path is the sound decoded by ffmpeg
 };
 

@@ -10,8 +10,8 @@
 #include <cmath>
 #include <iterator>
 
-#include "cli/input/explain.h"
 #include "cli/input/player_offset.h"
+#include "cli/input/recognise.h"
 #include "cli/system.h"
 #include "cli/write/click.h"
 #include "cli/write/value_text.h"
@@ -106,19 +106,18 @@ void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record
     record found = out;
     found.mode = search.mode;
     if (opts.mode != search.mode) analyse_opened(search, stop_fd, song, found);
-    failure failed = {found.error};
-    if (!failed) {
+    if (found.error.empty()) {
         if (is_refined(found) || found.loudest <= 0.0 || found.loudest >= kRaisedPower) return;
         const double gain = std::sqrt(kRaisedPower / found.loudest);
         song_file raised;
-        failed = raise_song(out.file, opts, stop_fd, song, gain, out.offset_ms, raised);
-        if (!failed) analyse_opened(search, stop_fd, raised, found);
+        found.error =
+            raise_song(out.file, opts, stop_fd, song, gain, out.offset_ms, raised).sentence;
+        if (found.error.empty()) analyse_opened(search, stop_fd, raised, found);
         close_song(raised);
-        if (!failed) failed = {found.error};
     }
-    if (failed) {
+    if (!found.error.empty()) {
         out.status = outcome::failed;
-        out.error = "The song could not be raised in level. " + failed.sentence;
+        out.error = "The song could not be raised in level. " + found.error;
         return;
     }
     out.raised = true;
@@ -141,7 +140,6 @@ void analyse_refused(const options &opts, int stop_fd, int32_t code, song_file &
             return analyse_opened(opts, stop_fd, song, out);
         }
     }
-    out.has_stream = stream.rate > 0;
     out.sample_rate = stream.rate;
     out.channels = stream.channels;
     out.duration_ms = stream.duration_ms;
@@ -155,7 +153,6 @@ void analyse_opened(const options &opts, int stop_fd, song_file &song, record &o
     TAVO_CTX *ctx = tavo_init(&param, &code);
     if (ctx == nullptr) return analyse_refused(opts, stop_fd, code, song, out);
     tavo_get_stream(ctx, &out.sample_rate, &out.channels, &out.duration_ms);
-    out.has_stream = true;
     out.offset_ms = find_player_offset_ms(song.path, out.sample_rate, out.channels);
     if (out.duration_ms > opts.max_minutes * kMsPerMinute) {
         out.error = "The audio lasts " + whole_clock_text(static_cast<double>(out.duration_ms)) +
@@ -185,7 +182,8 @@ int64_t cpu_time_ms() {
 }  // namespace
 
 record analyse(const std::string &path, const options &opts, int stop_fd, song_file &song) {
-    record out = failed_record(path, opts.mode, open_song(path, stop_fd, song).sentence);
+    record out = {path, opts.mode};
+    out.error = open_song(path, stop_fd, song).sentence;
     output_file click;
     if (out.error.empty()) out.error = begin_click(click, opts, path).sentence;
     if (!out.error.empty()) return out;

@@ -1,7 +1,7 @@
 // Analyses one file: creates an instance of the library, runs its job and releases it.
 //
-// In: a path and options. Out: a record. Runs in a worker process (worker_process.h), which has at
-// most one instance at a time. Precedes write/format.h.
+// Input: a path and options. Output: a record. Follows input/song_file.h; precedes write/format.h.
+// Runs in a worker process, which has at most one instance at a time.
 #ifndef TAVO_CLI_RUN_ANALYSE_H
 #define TAVO_CLI_RUN_ANALYSE_H
 
@@ -11,8 +11,8 @@
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// Blocks until the job has ended. The job is stopped if stop_fd becomes readable or is closed at
-// its other end. song receives the analysed sound, if path could be opened; the caller closes it.
+// Returns after the job has ended. If stop_fd becomes readable, the job is stopped. If the path
+// could be opened, `song` receives the sound that was analysed, and the caller closes it.
 record analyse(const std::string &path, const options &opts, int stop_fd, song_file &song);
 
 #endif

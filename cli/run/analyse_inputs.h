@@ -1,5 +1,8 @@
-// Sends inputs to the worker processes, and their replies to the store and, in the order of the
-// inputs, to the output.
+// Runs the command: sends inputs to the worker processes, and their replies to the store and to the
+// output.
+//
+// Input: options. Output: an exit status. Uses input/inputs.h, process_pool.h, ordered_output.h and
+// store/store.h.
 #ifndef TAVO_CLI_RUN_ANALYSE_INPUTS_H
 #define TAVO_CLI_RUN_ANALYSE_INPUTS_H
 

@@ -1,8 +1,10 @@
 #include "cli/run/ordered_output.h"
 
+#include <sys/ioctl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <csignal>
 
@@ -13,27 +15,38 @@
 
 namespace {
 
-void write_result(ordered_output &output, const std::string &text) {
-    if (text.empty() || output_failed(output)) return;
-    clear_progress(output.bar);
-    const int code = write_all(STDOUT_FILENO, text);
-    output.reader_gone = code == EPIPE;
-    if (code != EPIPE) output.write_error = code;
+constexpr double kFirstDrawSeconds = 1.0;  // shorter work has no progress line
+constexpr size_t kMostBarColumns = 40;
+constexpr size_t kUsualColumns = 80;
+constexpr const char *kClearLine = "\r\x1b[K";
+
+void clear_progress(ordered_output &output) {
+    if (output.is_drawn) write_all(STDERR_FILENO, kClearLine);
+    output.is_drawn = false;
 }
 
-// Records that part of the index could not be written.
-void note_index_failure(ordered_output &output, const failure &failed) {
-    if (!failed) return;
-    output.a_file_failed = true;
-    write_message(output, "tavo: " + failed.sentence + "\n");
+void write_result(ordered_output &output, const std::string &text) {
+    if (text.empty() || output.write_error != 0) return;
+    clear_progress(output);
+    output.write_error = write_all(STDOUT_FILENO, text);
 }
 
 void write_reply(ordered_output &output, const reply &answer) {
     if (answer.status == outcome::stopped) return;
-    note_index_failure(output, add_report_row(output.index, answer.row));
-    if (answer.status == outcome::failed) output.a_file_failed = true;
+    report_failure(output, add_report_row(output.index, answer.row));
+    if (answer.status == outcome::failed) output.has_failure = true;
     write_result(output, answer.result);
-    if (!output_failed(output)) write_message(output, answer.message);
+    if (output.write_error == 0) write_message(output, answer.message);
+}
+
+std::string progress_text(const ordered_output &output, double seconds) {
+    const double per_second = static_cast<double>(output.done) / seconds;
+    const std::string speed = formatted(", %.1f a minute", per_second * 60.0);
+    if (output.total == 0) return count_text(output.done, "file") + speed;
+    const double left_ms = 1000.0 * static_cast<double>(output.total - output.done) / per_second;
+    return " " + std::to_string(output.done) + "/" + std::to_string(output.total) + " files" +
+           speed +
+           (output.done == 0 ? ", time unknown" : ", " + whole_clock_text(left_ms) + " left");
 }
 
 }  // namespace
@@ -42,7 +55,8 @@ failure start_output(ordered_output &output, const options &opts) {
     if (failure failed = begin_report_index(output.index, opts)) return failed;
     struct stat info {};
     output.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
-    output.bar = start_progress(opts.quiet);
+    output.has_bar = !opts.quiet && isatty(STDERR_FILENO) == 1;
+    output.started = std::chrono::steady_clock::now();
     write_result(output, format_head(opts.format));
     return {};
 }
@@ -60,21 +74,43 @@ void accept_reply(ordered_output &output, size_t index, reply &&answer) {
 
 void write_message(ordered_output &output, const std::string &text) {
     if (text.empty()) return;
-    clear_progress(output.bar);
+    clear_progress(output);
     write_all(STDERR_FILENO, text);
 }
 
-bool output_failed(const ordered_output &output) {
-    return output.reader_gone || output.write_error != 0;
+bool report_failure(ordered_output &output, const failure &failed) {
+    if (!failed) return false;
+    output.has_failure = true;
+    write_message(output, "tavo: " + failed.sentence + "\n");
+    return true;
 }
 
-int finish_output(ordered_output &output, const options &opts, bool has_other_error) {
-    clear_progress(output.bar);
-    note_index_failure(output, finish_report_index(output.index, opts));
-    if (output.write_error != 0) {
-        write_message(
-            output,
-            "tavo: " + system_sentence("The results cannot be written", output.write_error) + "\n");
+void draw_progress(ordered_output &output) {
+    if (!output.has_bar || output.total == 1) return;
+    const std::chrono::duration<double> run = std::chrono::steady_clock::now() - output.started;
+    if (run.count() < kFirstDrawSeconds) return;
+
+    winsize terminal{};
+    ioctl(STDERR_FILENO, TIOCGWINSZ, &terminal);
+    // Some terminals wrap after the last column.
+    const size_t columns = (terminal.ws_col > 0 ? terminal.ws_col : kUsualColumns) - 1;
+    const std::string text = progress_text(output, run.count());
+    std::string line;
+    if (output.total > 0 && columns > text.size() + 2) {
+        const size_t width = std::min(columns - text.size() - 2, kMostBarColumns);
+        const size_t filled = width * output.done / output.total;
+        line = "[" + std::string(filled, '#') + std::string(width - filled, '-') + "]";
+    }
+    write_all(STDERR_FILENO, "\r" + (line + text).substr(0, columns) + "\x1b[K");
+    output.is_drawn = true;
+}
+
+int finish_output(ordered_output &output, const options &opts) {
+    clear_progress(output);
+    report_failure(output, finish_report_index(output.index, opts));
+    if (output.write_error != 0 && output.write_error != EPIPE) {
+        report_failure(output,
+                       {system_sentence("The results cannot be written", output.write_error)});
     }
     if (stop_signal() != 0) {
         const std::string total = output.total == 0 ? "" : std::to_string(output.done) + " of ";
@@ -82,7 +118,6 @@ int finish_output(ordered_output &output, const options &opts, bool has_other_er
         write_message(output, "tavo: stopped; " + total + count_text(counted, "file") + " done.\n");
         return kExitSignal + stop_signal();
     }
-    if (output.reader_gone) return kExitSignal + SIGPIPE;
-    return output.a_file_failed || output.write_error != 0 || has_other_error ? kExitFailed
-                                                                              : kExitOk;
+    if (output.write_error == EPIPE) return kExitSignal + SIGPIPE;
+    return output.has_failure ? kExitFailed : kExitOk;
 }

@@ -1,40 +1,54 @@
-// Writes replies in the order of the inputs, whatever order they arrive in: results to
-// standard output, messages to standard error. Clears the progress line first.
+// Writes replies in the order of the inputs, whatever order they arrive in: results to standard
+// output, messages to standard error. On a terminal it also draws a progress line: a bar, files
+// done, files per minute and the time left.
+//
+// Input: replies of worker processes. Used by analyse_inputs.h.
 #ifndef TAVO_CLI_RUN_ORDERED_OUTPUT_H
 #define TAVO_CLI_RUN_ORDERED_OUTPUT_H
 
+#include <chrono>
 #include <cstddef>
-#include <cstdint>
 #include <map>
 #include <string>
 
 #include "cli/failure.h"
 #include "cli/options.h"
 #include "cli/report/report.h"
-#include "cli/run/messages.h"
-#include "cli/run/progress.h"
+#include "cli/run/worker_process.h"
 
 struct ordered_output {
     std::map<size_t, reply> waiting;  // replies that wait for those of earlier inputs
     size_t next = 0;                  // index of the next input to write
     size_t total = 0;                 // number of inputs, or 0 if not all are known yet
     size_t done = 0;                  // replies of analyses that were not stopped
-    bool a_file_failed = false;
-    bool reader_gone = false;  // the reader of standard output has closed it
-    int write_error = 0;       // errno of any other failure on standard output
-    output_file index;         // of the pages
-    bool to_pipe = false;      // standard output is a pipe, whose reader may end before the command
-    progress bar;
+    bool has_failure = false;         // a file or something else failed
+    int write_error = 0;              // errno of standard output; EPIPE if its reader closed it
+    output_file index;                // of the pages
+    bool to_pipe = false;   // standard output is a pipe, whose reader may end before the command
+    bool has_bar = false;   // standard error is a terminal, and not --quiet
+    bool is_drawn = false;  // the progress line is on the terminal
+    std::chrono::steady_clock::time_point started;
 };
+
+constexpr int kRedrawMs = 500;  // time between two redraws of the progress line
 
 // Fails if the report's index cannot be created.
 failure start_output(ordered_output &output, const options &opts);
-void accept_reply(ordered_output &output, size_t index, reply &&answer);
-void write_message(ordered_output &output, const std::string &text);
-bool output_failed(const ordered_output &output);
 
-// Call it after the last reply. Finishes the report's index and reports errors of the output and a
-// stop. Returns the exit status; has_other_error: something other than a file failed.
-int finish_output(ordered_output &output, const options &opts, bool has_other_error);
+// Writes the reply of the input `index`, or keeps it until those of earlier inputs have arrived.
+void accept_reply(ordered_output &output, size_t index, reply &&answer);
+
+// Writes to standard error, after clearing the progress line.
+void write_message(ordered_output &output, const std::string &text);
+
+// Writes a failure that does not belong to a file. Returns true if there was one.
+bool report_failure(ordered_output &output, const failure &failed);
+
+// Redraws the progress line if the work has taken at least a second, except for a single file.
+void draw_progress(ordered_output &output);
+
+// Finishes the report's index and reports errors of the output and a stop. Call it after the last
+// reply. Returns the exit status.
+int finish_output(ordered_output &output, const options &opts);
 
 #endif

@@ -2,7 +2,6 @@
 
 #include <sys/prctl.h>
 #include <sys/socket.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -10,9 +9,9 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
+#include <iterator>
 
 #include "cli/run/stop.h"
-#include "cli/run/worker_process.h"
 #include "cli/system.h"
 #include "cli/write/value_text.h"
 
@@ -25,10 +24,10 @@ constexpr milliseconds kStopPatience{1000};
 
 // Runs in the new process. It closes the sockets of the other workers, because with a copy left
 // open they would not notice that the command has ended.
-[[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_files &files, int fd) {
+[[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_file &file, int fd) {
     for (worker_process &other : pool.processes) close_fd(other.fd);
     ignore_stop_signals();
-    prctl(PR_SET_PDEATHSIG, remove_files_at_signal(files));
+    prctl(PR_SET_PDEATHSIG, remove_file_at_signal(file));
     if (getppid() != command) _exit(kExitFailed);  // the command has already ended
     exit(serve_requests(fd, pool.opts));
 }
@@ -36,14 +35,14 @@ constexpr milliseconds kStopPatience{1000};
 failure start_process(process_pool &pool) {
     worker_process worker;
     int ends[2] = {-1, -1};
-    worker.files = make_temporary_files();
+    worker.file = share_temporary_file();
     const pid_t command = getpid();
-    if (worker.files != nullptr && socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) == 0) {
+    if (worker.file != nullptr && socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) == 0) {
         worker.pid = fork();
     }
     if (worker.pid == 0) {
         close(ends[0]);
-        become_worker(pool, command, *worker.files, ends[1]);
+        become_worker(pool, command, *worker.file, ends[1]);
     }
     const int code = errno;
     worker.fd = ends[0];
@@ -56,9 +55,22 @@ failure start_process(process_pool &pool) {
     return {};
 }
 
+// Returns an idle worker or a new one. Returns null if all workers are busy, or if none could be
+// started, which sets `failed`.
+worker_process *find_idle(process_pool &pool, failure &failed) {
+    for (worker_process &worker : pool.processes) {
+        if (!worker.current) return &worker;
+    }
+    if (pool.processes.size() >= static_cast<size_t>(pool.opts.jobs)) return nullptr;
+    const failure not_started = start_process(pool);
+    if (!not_started) return &pool.processes.back();
+    if (pool.processes.empty()) failed = not_started;
+    return nullptr;
+}
+
 // Returns the result of a job whose worker ended without a reply.
 record unfinished_record(const process_pool &pool, const worker_process &worker, int status) {
-    record result = failed_record(worker.current.message.path, pool.opts.mode, "");
+    record result = {worker.current->entry.path, pool.opts.mode};
     if (pool.is_stopping) {
         result.status = outcome::stopped;
     } else if (steady_clock::now() >= worker.deadline) {
@@ -70,21 +82,18 @@ record unfinished_record(const process_pool &pool, const worker_process &worker,
     return result;
 }
 
-void finish_job(process_pool &pool, worker_process &worker, reply &&answer) {
-    worker.is_busy = false;
+void finish_job(const process_pool &pool, worker_process &worker, reply &&answer) {
+    pool.on_reply(std::move(*worker.current), std::move(answer));
+    worker.current.reset();
     worker.deadline = time_point::max();
-    pool.on_reply(std::move(worker.current), std::move(answer));
 }
 
 // Called when the worker has closed its socket.
 void reap(process_pool &pool, worker_process &worker) {
     close_fd(worker.fd);
-    int status = 0;
-    while (waitpid(worker.pid, &status, 0) < 0 && errno == EINTR) {
-    }
-    worker.pid = -1;
-    remove_files(*worker.files);
-    if (worker.is_busy) {
+    const int status = wait_for_end(worker.pid);
+    remove_file(*worker.file);
+    if (worker.current) {
         finish_job(pool, worker, make_reply(unfinished_record(pool, worker, status), pool.opts));
     } else if (status != 0 && !pool.is_stopping) {
         pool.on_bad_end(
@@ -106,30 +115,23 @@ void read_from(process_pool &pool, worker_process &worker) {
 
 }  // namespace
 
-worker_process *find_idle(process_pool &pool, failure &failed) {
-    for (worker_process &worker : pool.processes) {
-        if (!worker.is_busy) return &worker;
+bool send_job(process_pool &pool, job &next) {
+    failure &refusal = next.entry.refusal;
+    worker_process *worker = refusal ? nullptr : find_idle(pool, refusal);
+    if (refusal) {
+        const record result = {next.entry.path, pool.opts.mode, outcome::failed, refusal.sentence};
+        pool.on_reply(std::move(next), make_reply(result, pool.opts));
+        return true;
     }
-    if (pool.processes.size() >= static_cast<size_t>(pool.opts.jobs)) return nullptr;
-    const failure not_started = start_process(pool);
-    if (!not_started) return &pool.processes.back();
-    if (pool.processes.empty()) failed = not_started;
-    return nullptr;
-}
-
-void send_job(const process_pool &pool, worker_process &worker, job &&next) {
-    worker.current = std::move(next);
-    worker.is_busy = true;
+    if (worker == nullptr) return false;
+    const request message = {next.index, next.entry.path, next.stored};
+    worker->current = std::move(next);
     if (pool.opts.timeout_s > 0) {
-        worker.deadline = steady_clock::now() + std::chrono::seconds(pool.opts.timeout_s);
+        worker->deadline = steady_clock::now() + std::chrono::seconds(pool.opts.timeout_s);
     }
     // If the worker has died, read_from detects it, so no check is needed here.
-    write_all(worker.fd, encode(worker.current.message));
-}
-
-bool has_busy(const process_pool &pool) {
-    return std::any_of(pool.processes.begin(), pool.processes.end(),
-                       [](const worker_process &worker) { return worker.is_busy; });
+    write_all(worker->fd, encode(message));
+    return true;
 }
 
 void end_workers(process_pool &pool, bool is_stop) {
@@ -140,23 +142,19 @@ void end_workers(process_pool &pool, bool is_stop) {
     }
 }
 
-void append_watched(const process_pool &pool, std::vector<pollfd> &watched) {
-    for (const worker_process &worker : pool.processes) watched.push_back({worker.fd, POLLIN, 0});
-}
-
-int deadline_timeout_ms(const process_pool &pool) {
-    time_point first = time_point::max();
-    for (const worker_process &worker : pool.processes) first = std::min(first, worker.deadline);
-    if (first == time_point::max()) return -1;
-    const auto left = std::chrono::ceil<milliseconds>(first - steady_clock::now());
-    return static_cast<int>(std::max<int64_t>(left.count(), 0));
-}
-
-void serve_workers(process_pool &pool, const pollfd *watched) {
-    for (size_t i = 0; i < pool.processes.size(); ++i) {
-        if (watched[i].revents != 0) read_from(pool, pool.processes[i]);
-    }
+void poll_workers(process_pool &pool, std::vector<pollfd> &watched, int wait_ms) {
+    const size_t others = watched.size();
     for (const worker_process &worker : pool.processes) {
+        watched.push_back({worker.fd, POLLIN, 0});
+        if (worker.deadline == time_point::max()) continue;
+        const auto left = std::chrono::ceil<milliseconds>(worker.deadline - steady_clock::now());
+        const int left_ms = static_cast<int>(std::max<int64_t>(left.count(), 0));
+        wait_ms = wait_ms < 0 ? left_ms : std::min(wait_ms, left_ms);
+    }
+    const bool is_ready = poll(watched.data(), watched.size(), wait_ms) > 0;
+    for (size_t i = 0; i < pool.processes.size(); ++i) {
+        worker_process &worker = pool.processes[i];
+        if (is_ready && watched[others + i].revents != 0) read_from(pool, worker);
         if (worker.pid > 0 && steady_clock::now() >= worker.deadline) kill(worker.pid, SIGKILL);
     }
     const auto has_ended = [](const worker_process &worker) { return worker.pid < 0; };

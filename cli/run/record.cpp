@@ -4,14 +4,6 @@
 
 #include "include/tavo.h"
 
-record failed_record(const std::string &file, int32_t mode, const std::string &error) {
-    record result;
-    result.file = file;
-    result.mode = mode;
-    result.error = error;
-    return result;
-}
-
 double player_ms(const record &result, double ms) {
     return std::max(ms - result.offset_ms, 0.0);
 }

@@ -1,5 +1,5 @@
-// The result of one file. In: an analysis (analyse.h). Out: text, JSON, CSV and markers (format.h,
-// markers.h).
+// The result of one file. Follows analyse.h; precedes write/format.h, write/markers.h and
+// report/report.h, which write it.
 #ifndef TAVO_CLI_RUN_RECORD_H
 #define TAVO_CLI_RUN_RECORD_H
 
@@ -14,13 +14,12 @@ enum class outcome {
 };
 
 struct record {
-    std::string file;  // name from the user or the folder, any bytes
-    int32_t mode = 0;  // TAVO_MODE_*
+    std::string file = {};  // name from the user or the folder, any bytes
+    int32_t mode = 0;       // TAVO_MODE_*
     outcome status = outcome::failed;
-    std::string error;  // a sentence, or empty
+    std::string error = {};  // reason of a failure, or empty
 
-    bool has_stream = false;  // the next three fields are known
-    int32_t sample_rate = 0;  // Hz
+    int32_t sample_rate = 0;  // Hz; 0 if the stream is not known
     int32_t channels = 0;     // of the decoder's output
     int64_t duration_ms = 0;
     double offset_ms = 0.0;  // time in this record minus time in a player, see player_offset.h
@@ -33,28 +32,27 @@ struct record {
 
     bool has_beats = false;
     int32_t bpm = 0;
-    std::vector<float> beats_ms;  // ascending, from the start of the file
+    std::vector<float> beats_ms = {};  // ascending, from the start of the file
 
-    std::string decoder;     // "ffmpeg" if that program decoded the file, otherwise empty
-    std::string sound_path;  // file with its output, while the song is open
+    std::string decoder = {};     // "ffmpeg" if that program decoded the file, otherwise empty
+    std::string sound_path = {};  // path for the library, while the song is open
 
     int64_t cpu_ms = -1;  // processor time of all threads; -1 if not analysed
 
-    std::string written;  // path of the written marker file, or empty
+    std::string written = {};  // path of the written marker file, or empty
 };
-
-record failed_record(const std::string &file, int32_t mode, const std::string &error);
 
 // Converts a time of the record to the time of a player, at least 0.
 double player_ms(const record &result, double ms);
 
-// End of a highlight of length_s seconds, at most the end of the song.
+// Returns the end of a highlight that lasts length_s seconds, but at most the end of the song.
 double highlight_end_ms(const record &result, int32_t length_s);
 
-// has_refinement: the result shows whether the start of the highlight is exact to 0.4 s. In mode
-// both it does not, because a seek has moved the start. is_refined: the start is exact; otherwise
-// it is a point of the loudness curve.
+// True if the result shows whether the start of the highlight is exact to 0.4 s. In mode both it
+// does not, because a seek has moved the start.
 bool has_refinement(const record &result);
+
+// True if the start of the highlight is exact. Otherwise it is a point of the loudness curve.
 bool is_refined(const record &result);
 
 #endif

@@ -1,5 +1,5 @@
 // Stop signals: Ctrl-C, a termination request or a closed terminal. The first one asks the command
-// to stop, the second one ends it immediately.
+// to stop; the second one ends it immediately.
 #ifndef TAVO_CLI_RUN_STOP_H
 #define TAVO_CLI_RUN_STOP_H
 

@@ -7,9 +7,11 @@
 #include <array>
 #include <cerrno>
 #include <cstdlib>
+#include <cstring>
 #include <exception>
 #include <fstream>
 #include <iterator>
+#include <nlohmann/json.hpp>
 
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
@@ -21,9 +23,12 @@
 #include "cli/write/markers.h"
 #include "cli/write/output_file.h"
 
+NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(request, index, path, stored)
+NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(reply, status, result, message, json, row)
+
 namespace {
 
-// Bytes.
+// The sizes are in bytes.
 constexpr int kHeapAtStart = 16 << 20;       // the buffers of a short song
 constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappings
 constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
@@ -48,7 +53,7 @@ record read_stored(const request &message, const options &opts, int stop_fd, son
     return out;
 }
 
-// True if results go to a store.
+// True if the results are to be stored.
 bool is_stored(const options &opts) {
     return !opts.store.empty() && !opts.from_store;
 }
@@ -59,7 +64,8 @@ bool has_content(const std::string &path, const std::string &content) {
     return file && there == content;
 }
 
-failure write_markers(record &result, const options &opts, const std::string &target) {
+failure write_markers(record &result, const options &opts) {
+    const std::string target = marker_path(result.file, opts);
     const std::string content = marker_content(result, opts);
     // A command that was killed before it committed the row may have left the file.
     if (!is_stored(opts) || !has_content(target, content)) {
@@ -69,47 +75,42 @@ failure write_markers(record &result, const options &opts, const std::string &ta
     return {};
 }
 
-// Files written in addition to the result. A path is empty if its file was not requested.
-struct side_files {
-    std::string page;
-    std::string markers;
-    std::string clip;
-};
-
-// Names the files, and checks before the analysis that they can be written.
-failure find_side_files(const request &message, const options &opts, side_files &files) {
+// Checks, before the analysis, that the page, the marker file and the clip can be written.
+failure check_side_files(const request &message, const options &opts) {
     failure failed;
     if (!opts.report.empty()) {
-        files.page = report_page_path(opts, message.index, message.path);
-        failed = check_report(files.page, opts.force);
+        failed = check_report(report_page_path(opts, message.index, message.path), opts.force);
     }
     if (!failed && opts.markers != nullptr) {
-        files.markers = marker_path(message.path, opts);
-        // With a store an existing file may be this song's, so write_markers compares it.
-        failed = check_target(files.markers, opts.force || is_stored(opts));
+        // With a store, an existing file may belong to this song, so write_markers compares it.
+        const bool may_exist = opts.force || is_stored(opts);
+        failed = check_target(marker_path(message.path, opts), may_exist);
     }
     if (!failed && !opts.clip.empty()) {
-        files.clip = clip_path(message.path, opts);
-        failed = check_target(files.clip, opts.force);
+        failed = check_target(clip_path(message.path, opts), opts.force);
     }
     return failed;
 }
 
-failure write_side_files(record &result, const options &opts, const side_files &files, int stop_fd,
+// `row` receives the song's row of the index of pages, if there is one.
+failure write_side_files(record &result, const options &opts, uint64_t index, int stop_fd,
                          const song_file &song, std::string &row) {
     failure failed;
-    if (!files.page.empty()) failed = write_report_page(result, opts, files.page, stop_fd, row);
-    if (!failed && !files.markers.empty()) failed = write_markers(result, opts, files.markers);
-    if (!failed && !files.clip.empty()) {
-        failed = write_clip(result, opts, files.clip, stop_fd, song);
+    if (!opts.report.empty()) {
+        const std::string page = report_page_path(opts, index, result.file);
+        failed = write_report_page(result, opts, page, stop_fd, row);
+    }
+    if (!failed && opts.markers != nullptr) failed = write_markers(result, opts);
+    if (!failed && !opts.clip.empty()) {
+        failed = write_clip(result, opts, clip_path(result.file, opts), stop_fd, song);
     }
     return failed;
 }
 
-// Returns the reply for a failure that says nothing about the song. The store does not record it.
+// Returns the reply for a failure that is not the song's fault and that the store does not record.
 reply make_failed_reply(const request &message, const options &opts, int stop_fd,
                         const std::string &error) {
-    record result = failed_record(message.path, opts.mode, error);
+    record result = {message.path, opts.mode, outcome::failed, error};
     if (is_readable(stop_fd)) result.status = outcome::stopped;
     reply out = make_reply(result, opts);
     out.json.clear();
@@ -117,18 +118,17 @@ reply make_failed_reply(const request &message, const options &opts, int stop_fd
 }
 
 reply analyse_and_write(const request &message, const options &opts, int stop_fd) {
-    side_files files;
     song_file song;
     std::string row;
     record result;
-    failure failed = find_side_files(message, opts, files);
+    failure failed = check_side_files(message, opts);
     if (!failed) {
         result = message.stored.empty() ? analyse(message.path, opts, stop_fd, song)
                                         : read_stored(message, opts, stop_fd, song);
         result.length_s = opts.length_s;
     }
     if (result.status == outcome::ok) {
-        failed = write_side_files(result, opts, files, stop_fd, song, row);
+        failed = write_side_files(result, opts, message.index, stop_fd, song, row);
     } else if (is_readable(stop_fd)) {
         result.status = outcome::stopped;
     }
@@ -169,7 +169,7 @@ reply make_reply(const record &result, const options &opts) {
     out.status = result.status;
     out.result = format_record(opts, result);
     const std::string line = shown(result.file) + ": " + result.error + "\n";
-    if (opts.failed) {  // here a stored failure is a result
+    if (opts.failed) {  // then a stored failure is a result
         out.status = outcome::ok;
         if (opts.format == result_format::text) out.result = line;
     } else if (result.status == outcome::failed) {
@@ -194,3 +194,30 @@ int serve_requests(int fd, const options &opts) {
         if (write_all(fd, serve(message, opts, fd)) != 0) return kExitOk;
     }
 }
+
+// An encoded message is a CBOR object, preceded by its size in bytes. Its texts may contain any
+// bytes, because neither side checks that they are UTF-8.
+
+template <typename record_type>
+std::string encode(const record_type &message) {
+    std::string bytes;
+    nlohmann::json::to_cbor(message, bytes);
+    const size_t size = bytes.size();
+    return std::string(reinterpret_cast<const char *>(&size), sizeof size) + bytes;
+}
+
+template <typename record_type>
+bool decode(std::string &received, record_type &message) {
+    size_t size = 0;
+    if (received.size() < sizeof size) return false;
+    memcpy(&size, received.data(), sizeof size);
+    if (received.size() - sizeof size < size) return false;
+    nlohmann::json::from_cbor(received.substr(sizeof size, size)).get_to(message);
+    received.erase(0, sizeof size + size);
+    return true;
+}
+
+template std::string encode(const request &message);
+template std::string encode(const reply &message);
+template bool decode(std::string &received, request &message);
+template bool decode(std::string &received, reply &message);

@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <filesystem>
 
-#include "cli/input/ffmpeg_process.h"
+#include "cli/input/ffmpeg.h"
 #include "cli/write/file_names.h"
 #include "cli/write/output_file.h"
 #include "cli/write/value_text.h"

@@ -14,7 +14,7 @@ result_json json_object(const record &result) {
     if (object["file"] != result.file) object["file_bytes"] = percent_encoded(result.file);
     object["mode"] = mode_word(result.mode);
     object["status"] = kStatusWords[static_cast<int>(result.status)];
-    if (result.has_stream) {
+    if (result.sample_rate > 0) {
         object["sample_rate"] = result.sample_rate;
         object["channels"] = result.channels;
         object["duration_ms"] = result.duration_ms;
@@ -45,10 +45,10 @@ std::string json_record(const record &result) {
 
 record record_from_json(const std::string &text) {
     const result_json object = result_json::parse(text);
-    record out =
-        failed_record("", mode_of(object.at("mode").get<std::string>()), object.value("error", ""));
+    record out;
+    out.mode = mode_of(object.at("mode").get<std::string>());
+    out.error = object.value("error", "");
     if (object.at("status") == kStatusWords[0]) out.status = outcome::ok;
-    out.has_stream = object.contains("sample_rate");
     out.sample_rate = object.value("sample_rate", 0);
     out.channels = object.value("channels", 0);
     out.duration_ms = object.value("duration_ms", int64_t{0});

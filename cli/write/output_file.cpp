@@ -9,7 +9,6 @@
 #include <cstdlib>
 #include <filesystem>
 
-#include "cli/run/temporary_files.h"
 #include "cli/system.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
@@ -92,7 +91,7 @@ void abandon_output(output_file &file) {
     file.fd = -1;
     if (!file.temporary.empty()) {
         unlink(file.temporary.c_str());
-        forget_temporary_file(file.temporary);
+        note_temporary_file("");
     }
     file.temporary.clear();
 }
