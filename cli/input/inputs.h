@@ -60,9 +60,9 @@ enum class supply_state {
 // Folders are searched for audio files, which are recognised by content, not by name; refused
 // formats count as audio, so that they are reported. With --recursive the folders inside, including
 // linked ones, are searched too, each once. A file or folder that cannot be read becomes an input
-// with a refusal, and so does a folder without audio. If each
-// input has a marker file or a clip, no two inputs get the same one. Memory grows with the folders
-// that are searched and the files that will be written, but not with the length of a list.
+// with a refusal, and so does a folder without audio. If each input has a marker file or a
+// clip, no two inputs get the same one. Memory grows with the folders that are searched and the
+// files that will be written, but not with the length of a list.
 supply_state next_input(input_supply &supply, input &out);
 
 #endif

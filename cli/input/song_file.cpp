@@ -144,8 +144,8 @@ failure store_sound(decoding &sound, std::string_view part) {
 }
 
 // Decodes the first audio stream of source_fd, or of `path` if source_fd is negative, to a WAV file
-// in memory: one channel of 16 bits, at the stream's own rate or the nearest supported one, on the
-// timeline of players.
+// in memory: 16-bit mono, at the stream's own rate or the nearest supported one, on a player's
+// timeline.
 failure decode(const std::string &path, const options &opts, int stop_fd, int source_fd,
                const std::string &filter, song_file &song) {
     decoding sound;

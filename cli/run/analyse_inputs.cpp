@@ -16,7 +16,7 @@
 namespace {
 
 constexpr size_t kMostAhead = 10'000;   // inputs that wait for a worker
-constexpr size_t kFoundAtOnce = 64;     // names examined between two calls of poll
+constexpr size_t kFoundAtOnce = 64;     // names examined between two calls to poll
 constexpr size_t kMostWaiting = 1'000;  // results that may wait for an earlier one
 
 struct run_state {

@@ -48,7 +48,7 @@ double player_ms(const record &result, double ms);
 // Returns the end of a highlight that lasts length_s seconds, but at most the end of the song.
 double highlight_end_ms(const record &result, int32_t length_s);
 
-// True if the result shows whether the start of the highlight is exact to 0.4 s. In mode both it
+// True if the result shows whether the start of the highlight is exact to 0.4 s. In mode both, it
 // does not, because a seek has moved the start.
 bool has_refinement(const record &result);
 

@@ -34,7 +34,7 @@ constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappi
 constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
 constexpr int kFreeMemoryKept = 64 << 20;
 
-// Returns a result of the store. Opens the song if its page is requested.
+// Returns a result from the store. Opens the song if its page is requested.
 record read_stored(const request &message, const options &opts, int stop_fd, song_file &song) {
     record out;
     try {
