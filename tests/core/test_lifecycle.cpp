@@ -170,9 +170,7 @@ TEST(Lifecycle, StopDuringDecodingSkipsTheBeats) {
         for_each_mode(kModes, [watched](int32_t mode, TAVO_CTX *ctx) {
             SCOPED_TRACE(watched);
             original_get_frm = ctx->seg[0].src->get_frm;
-            for (int32_t i = 0; i < ctx->seg_count; ++i) {
-                ctx->seg[i].src->get_frm = read_after_stop;
-            }
+            for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].src->get_frm = read_after_stop;
             block_callback_of(ctx);
             // Threads start in this order: the job's, its four decoding threads, the watcher.
             fault::arm({fault::kThread, watched ? INT64_MAX : 5});

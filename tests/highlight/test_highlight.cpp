@@ -320,17 +320,15 @@ TEST(Tune, MovesToTheSharpestRise) {
     EXPECT_EQ(tune("6 0 5 .5 7 0 5 .5 7 0"), 2400u);  // the first of two equal rises
 }
 
-// The coarse start is 54 s. Tuning moves it to the first window that is completely loud.
-TEST(Position, ReturnsTheTunedStart) {
+// Tuning moves the coarse start to the first window that is completely loud. It needs enough PCM
+// for all its windows.
+TEST(Position, IsTheTunedStart) {
     EXPECT_EQ(find_position(make_pcm("60 .04 40 .64 20 .04", kRate), 120, 58), 60200u);
+    EXPECT_EQ(find_position(make_pcm("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);
+    EXPECT_EQ(find_position(make_pcm("116 .04 2 .64 2 .04", kRate), 200, 58),
+              112000u);  // not tuned
     EXPECT_EQ(find_position({}, 120, 0), 0u);
     EXPECT_EQ(find_position(make_pcm("47999 .5", 1), 5, 0), 0u);
     EXPECT_EQ(find_position(std::vector<int16_t>(120 * kRate), 120, 58), 0u);
     clearHighlgihtCtx(nullptr);
-}
-
-// The coarse start of 112 s is tuned only if the PCM is long enough for all windows.
-TEST(Position, TuningDoesNotReadPastThePcm) {
-    EXPECT_EQ(find_position(make_pcm("116 .04 2 .64 2 .04", kRate), 200, 58), 112000u);
-    EXPECT_EQ(find_position(make_pcm("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);
 }
