@@ -26,10 +26,10 @@ using signal_handler = void (*)(int);
 // previous handler.
 signal_handler set_signal_handler(int number, signal_handler handler);
 
-// Waits for a child process to end and sets pid to -1. Returns the status of waitpid.
+// Waits for a child process to end and sets pid to -1. Returns the waitpid status.
 int wait_for_end(pid_t &pid);
 
-// Converts a status of waitpid to words: "by signal 9 (Killed)" or "with status 1".
+// Converts a waitpid status to words: "by signal 9 (Killed)" or "with status 1".
 std::string ending_text(int status);
 
 // The name of the temporary file that a worker process is writing, in memory shared with the

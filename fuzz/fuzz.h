@@ -1,5 +1,5 @@
 // Code that the fuzzers share. Each fuzzer turns an input's bytes into valid arguments and aborts
-// if the library breaks a promise. Choices come from the end, so any audio file can be an input.
+// if the library breaks a promise. Any audio file can be an input; choices use its last bytes.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 

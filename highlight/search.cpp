@@ -147,8 +147,8 @@ int32_t choose_edge(const search_state *s) {
     return scored != 0 ? scored : first_loud_edge(s);
 }
 
-// Returns the start of the first loud segment or the first valley, whichever comes first. It is
-// used if even a region that starts there would reach the end of the song.
+// Returns the start of the first loud segment or the first valley, whichever comes first. It is the
+// highlight start if a region of the requested length from there reaches the end of the song.
 int32_t fallback_point(const search_state *s) {
     const int32_t start = s->nseg > 0 ? s->start[0] : 0;
     const int32_t valley = s->nv > 0 ? s->valley[0] : 0;

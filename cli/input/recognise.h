@@ -43,7 +43,7 @@ int64_t find_id3v2_end(const std::string &path, int &code);
 // tavo_probe, which stored `stream`. Reads the file to find errors that the library does not name.
 std::string explain_refusal(const std::string &path, int32_t code, const TAVO_STREAM &stream);
 
-// Returns the reason why an analysis received no audio or, with has_audio, only a part of it.
+// Returns the reason why an analysis received no audio or, with has_audio, only part of it.
 std::string explain_lost_audio(const std::string &path, bool has_audio);
 
 #endif

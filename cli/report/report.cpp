@@ -97,7 +97,7 @@ std::string index_row(const record &result, const result_json &view, const std::
            miniature(view["loudness"]) + "</td></tr>\n";
 }
 
-// Returns the path of the folder of the songs' pages, which is beside the index.
+// Returns the path of the folder for the songs' pages, next to the index.
 std::string pages_folder(const options &opts) {
     return fs::path(opts.report).replace_extension().string() + "_songs";
 }

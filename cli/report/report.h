@@ -13,8 +13,8 @@
 #include "cli/run/record.h"
 #include "cli/write/output_file.h"
 
-// Returns the path of a song's page: opts.report for a single file, otherwise a file in the folder
-// of the pages.
+// Returns the path of a song's page: opts.report for a single file, otherwise a file in the pages
+// folder.
 std::string report_page_path(const options &opts, uint64_t index, const std::string &song);
 
 // Checks that a page can be written. A page never replaces a song or a device.

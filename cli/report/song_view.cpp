@@ -133,7 +133,7 @@ result_json searched_span(const record &result, size_t count) {
     const int skip = is_short ? 0 : TAVO_SEARCH_SKIP;
     const int tail = is_short ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
     const double start = skip * kHopMs;
-    // The last window that is searched may have its rise at its end.
+    // The rise may be at the end of the last window searched, so the span includes all of it.
     const double last = static_cast<double>(count) - tail;
     const double end = last < 0.0 ? start : last * kHopMs + kWindowMs;
     return {player_ms(result, start), player_ms(result, std::max(start, end))};

@@ -102,7 +102,7 @@ void wait_and_serve(run_state &state) {
     draw_progress(state.output);
 }
 
-// Ends the workers at a stop or if no work is left.
+// Ends the workers if a stop is requested or no work is left.
 void end_if_done(run_state &state) {
     if (state.is_ending) return;
     const bool is_stop = stop_signal() != 0 || state.output.write_error != 0 || state.db.has_failed;

@@ -47,7 +47,7 @@ bool report_failure(ordered_output &output, const failure &failed);
 // Redraws the progress line if the work has taken at least a second, except for a single file.
 void draw_progress(ordered_output &output);
 
-// Finishes the report's index and reports errors of the output and a stop. Call it after the last
+// Finishes the report's index and reports output errors and a stop. Call it after the last
 // reply. Returns the exit status.
 int finish_output(ordered_output &output, const options &opts);
 

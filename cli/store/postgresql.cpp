@@ -21,8 +21,8 @@ std::string message_of(const database &db) {
     return text;
 }
 
-// True unless the error is temporary: an error of the connection, of concurrent transactions,
-// resources or locks, or of a server that shuts down. A missing code means a lost connection.
+// True unless the error is temporary: a lost connection, conflicting transactions, a lack of
+// resources, a lock, or a server shutdown or failure. A missing code means a lost connection.
 bool is_permanent(const char *sql_state) {
     if (sql_state == nullptr) return false;
     const std::string_view code_class(sql_state, 2);

@@ -35,7 +35,7 @@ constexpr size_t kAddedColumns = 2;
 
 enum class column_type { text, whole, real, list };  // list: a JSON array of numbers
 
-// A column that holds a part of the result, and the key of that part in JSON.
+// A column that holds part of the result, and the key of that part in JSON.
 struct result_column {
     const char *name;
     const char *key;

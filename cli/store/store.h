@@ -50,8 +50,8 @@ struct store {
 failure open_store(store &db, const options &opts);
 
 // The following functions retry while the database does not answer, with growing pauses, for at
-// most --patience. Each pause is reported on standard error and ends at a stop. After a failure the
-// store is no longer used.
+// most --patience. Each pause is reported on standard error, and a stop ends it early. After a
+// failure the store is no longer used.
 
 // Sets is_new if the song must be analysed: its current file is not stored for these parameters, or
 // the options request another analysis. file receives the state of the file.

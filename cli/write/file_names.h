@@ -1,4 +1,4 @@
-// Converts file names, which are any bytes, to text for people, JSON, pages and URLs.
+// Converts file names, which may be any bytes, to readable text, JSON, pages and URLs.
 #ifndef TAVO_CLI_WRITE_FILE_NAMES_H
 #define TAVO_CLI_WRITE_FILE_NAMES_H
 

@@ -27,7 +27,7 @@ constexpr const char *kColumns[] = {"file",      "mode",        "status",    "sa
                                     "hl_end_ms", "hl_refined",  "bpm",       "beat_count",
                                     "beats_ms",  "cpu_ms",      "error"};
 
-// ---- Text for people.
+// ---- Human-readable text.
 
 std::string highlight_lines(const record &result) {
     const bool is_coarse = has_refinement(result) && !is_refined(result);
@@ -68,7 +68,7 @@ std::string name_text(const std::string &name) {
     return isatty(STDOUT_FILENO) == 1 ? shown(name) : name;
 }
 
-// Quotes the text if necessary. The format is for programs, so a text that begins with = + - @ is
+// Quotes the text if necessary. The format is for programs, so text that begins with = + - or @ is
 // not changed.
 std::string quoted(const std::string &text) {
     const std::string value = name_text(text);

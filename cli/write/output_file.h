@@ -6,7 +6,7 @@
 
 #include "cli/failure.h"
 
-// A temporary file in the folder of the target, with the permissions of a new file.
+// A temporary file in the target's folder, with the permissions of a new file.
 struct output_file {
     std::string target;
     std::string temporary;  // path; empty before begin_output and after the file is gone

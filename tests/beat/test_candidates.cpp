@@ -106,7 +106,7 @@ TEST(Candidates, LongGapsGetTheirStrongestPeaks) {
     EXPECT_EQ(find_beats(env), (frames{100, 300, 400, 500, 600, 700, 800}));
 }
 
-// Twelve gaps could take five peaks each. No gap is filled once more than 45 beats were added.
+// Twelve gaps could take five peaks each, but no gap is filled after the first 46 added beats.
 TEST(Candidates, AtMostFiftyBeatsAreAdded) {
     envelope env = {4300, 120, {}};
     for (int64_t k = 0; k <= 12; ++k) {

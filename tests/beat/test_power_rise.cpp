@@ -69,8 +69,8 @@ std::vector<double> changing_noise(size_t n, std::mt19937 *random) {
 
 }  // namespace
 
-// The signals end near the end of a block or anywhere. They are noise of changing loudness or have
-// extreme values, NaN or infinities. In some the means are whole numbers, so that rounding matters.
+// Half the signals end near a block boundary. They are noise of changing loudness or have extreme
+// values, NaN or infinities. In some the means are whole numbers, so that rounding matters.
 TEST(PowerRise, EqualsThePlainSearch) {
     std::mt19937 random(7);
     int found = 0;

@@ -71,8 +71,8 @@ class Case(unittest.TestCase):
         self.assertEqual({p.name for p in self.folder.iterdir()}, set(names))
 
     def run_tavo(self, *arguments, status=0, printed=None, message=b"", before=(), **options):
-        """Runs the command in the folder of the test and checks its exit status. Also checks that `printed` is the
-        standard output and that `message` is a part of the messages. Arguments may be bytes."""
+        """Runs the command in the test's folder and checks its exit status. Also checks that the standard output
+        equals `printed` and that the messages contain `message`. Arguments may be bytes."""
         options = {"input": b"", "cwd": self.folder, "timeout": 250, **options}
         done = subprocess.run([*before, TAVO, *arguments], capture_output=True, **options)
         details = (arguments, done.stdout, done.stderr)

@@ -73,7 +73,7 @@ class Ffmpeg(Case):
         self.assertEqual(len(os.listdir(self.folder / "clips")), len(CLIPPED))
 
     def test_offset_is_the_delay_of_the_library(self):
-        """Finds a part of the noise in the sound of a player and in that of the library."""
+        """Finds part of the noise in a player's sound and in the library's."""
         noise = np.random.default_rng(1).normal(0, 9000, 6 * RATE)
         samples = np.clip(noise + np.roll(noise, 1), -32768, 32767).astype("<i2").repeat(2)  # stereo
         self.put("n.wav", wav(channels=2, seconds=0)[:40] + samples.nbytes.to_bytes(4, "little") + samples.tobytes())

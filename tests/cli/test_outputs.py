@@ -5,7 +5,7 @@ import resource
 from command_case import AS_ORDINARY_USER, Case, short_song, wav
 
 LABELS = ["--format", "labels"]
-ALL = (  # arguments, the file written for song.wav, a part of its content
+ALL = (  # arguments, the file written for song.wav, part of its content
     (LABELS, "song.wav.labels.txt", b"highlight"), (["--click", "c.wav"], "c.wav", b"RIFF"),
     (["--report", "page.html"], "page.html", b"song.wav"), (["--clip", "k.wav", "-l", "2"], "k.wav", b"RIFF"))
 

@@ -92,7 +92,7 @@ class Report(Browser):
         self.put("song.wav", source=standard_song())
         (result,) = self.run_json("--length", "12", "--report", "page.html", "song.wav")
         self.show("page.html")
-        self.click("tobeat", "out", "out", "out")  # shows a part of the song
+        self.click("tobeat", "out", "out", "out")  # shows part of the song
         start, end = self.script("return [view.from, view.to]")
         root = ElementTree.fromstring(self.script("return pictureSvg()"))
         lines = [e for e in root.iter() if e.get("class") in ("beat", "start")]

@@ -31,7 +31,7 @@ USAGE = [
     ("--normalize --no-ffmpeg a.wav", "needs the ffmpeg"), ("--normalize -m beats a.wav", "needs a highlight"),
     ("--normalize --store a.db a.wav", "cannot be combined with --store"),
 ]
-REFUSED = {  # file: its content and a part of the reason
+REFUSED = {  # file: its content and part of the reason
     "empty.wav": (b"", "empty"),
     "fifteen.wav": (b"RIFF\0\0\0\0WAVEfmt", "too short to be audio: it has 15 bytes"),
     "text.wav": (b"This is a letter, not a song.\n" * 99, "not recognised"),

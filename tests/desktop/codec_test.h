@@ -42,7 +42,7 @@ inline std::string save(const std::string &name, const std::string &contents) {
     return path;
 }
 
-// A source for a file. It is null if the file cannot be opened; then `error` is the reason.
+// A source for a file. If the file cannot be opened, it is null and `error` is the reason.
 struct open_source {
     mtsrc_ctx *source = nullptr;
     int32_t error = 0;

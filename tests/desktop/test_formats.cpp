@@ -181,7 +181,7 @@ TEST(Flac, DeliversBothChannels) {
     expect_equal(right, mix_with_ffmpeg("song.wav", "=c1"));
 }
 
-// The readers accept that a callback delivers only a part of a large read.
+// The readers accept a callback that delivers only part of a large read.
 TEST(Reader, AcceptsShortReads) {
     for (const char *name :
          {"song.wav", "cbr.mp3", "song.flac", "low.aac", "last.m4a", "song.ogg"}) {

@@ -256,7 +256,7 @@ TEST(Region, EndsAtAValleyOrAFall) {
         {"a segment at the start of the song", loud, 40, 15, {50}, {0, 90}, 35},
         {"the valley at the end is 25 points on", loud, 40, 30, {65}, {}, 35},
         {"the valley at the end is too far", loud, 40, 30, {66}, {}, 10},
-        // Without a valley the end is searched for from 14 s to 48 s after the chosen point.
+        // Without a valley, the search for the end covers 14 s to 48 s after the chosen point.
         {"a fall by exactly one deviation", falls, 40, 15, {}, {}, 35, 0.625f},
         {"the deepest of smaller falls", falls, 40, 20, {}, {}, 35, 0.875f},
         {"the latest fall", "64 1 4 .25 52 1", 40, 28, {}, {}, 36},

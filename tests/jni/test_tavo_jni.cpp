@@ -81,7 +81,7 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     EXPECT_EQ(machine_state.log_lines, kNotNotified + kNoInstance);
     EXPECT_EQ(tavo_jni_mutex, nullptr);
 
-    // An existing lock is used. It is free while the path is read and held while it is released.
+    // An existing lock is used: free while the path is read, held when the path is released.
     pthread_mutex_t existing_lock = PTHREAD_MUTEX_INITIALIZER;
     tavo_jni_mutex = &existing_lock;
     std::vector<int> trials;

@@ -148,7 +148,7 @@ int32_t decode(const void *handle, const wexa_frame *input, wexa_output *output,
         memcpy(&compressed, bytes, sizeof compressed);
     }
     status->produced = 0;
-    // Other bytes are the set-up data, which has no output, or an incomplete frame.
+    // Other bytes are the set-up data, which produces no output, or an incomplete frame.
     if (strncmp(compressed.magic, compressed_frame().magic, 8) != 0) {
         return next_result(output->data ? -1 : 0);
     }

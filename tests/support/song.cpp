@@ -58,7 +58,7 @@ double bed_gain_at(const song_spec &plan, double t) {
     return gain_at(plan, t) * (accent ? kAccent : 1.0);
 }
 
-// Returns the bed's gain without steps. It reaches a new value after kFadeSeconds.
+// Returns the bed's gain, with each step split into four smaller ones within kFadeSeconds.
 double faded_bed_gain_at(const song_spec &plan, double t) {
     double sum = 0.0;
     for (int k = 0; k < 4; ++k) sum += bed_gain_at(plan, t - kFadeSeconds * k / 4.0);
