@@ -29,7 +29,7 @@ NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(reply, status, result, message, json, row)
 namespace {
 
 // The sizes are in bytes.
-constexpr int kHeapAtStart = 16 << 20;       // the buffers of a short song
+constexpr int kHeapAtStart = 12 << 20;       // the buffers of a short song
 constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappings
 constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
 constexpr int kFreeMemoryKept = 64 << 20;
