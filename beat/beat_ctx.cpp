@@ -9,8 +9,8 @@ pthread_cond_t *feat_cond_mt = nullptr;
 
 namespace {
 
-// Returns the number of whole analysis frames. The division truncates toward zero, so a signal that
-// is less than one hop too short for a frame still counts as one frame, which is never read.
+// Returns the number of whole analysis frames. Also returns 1 for a signal that is shorter than a
+// frame by less than one hop, because the division truncates toward zero. That frame is never read.
 int64_t count_frames(int64_t samples, int32_t frame_size, int32_t hop_size) {
     if (frame_size < 1 || hop_size < 1) return 0;
     return (samples - frame_size) / hop_size + 1;

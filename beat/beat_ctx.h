@@ -52,10 +52,10 @@ extern "C" {
 extern pthread_mutex_t *feat_mutex_mt;
 extern pthread_cond_t *feat_cond_mt;
 
-// Fills a zeroed context from the instance. If memory runs out, some of its pointers stay null.
+// Fills the zeroed `beat` from `ctx`. If memory runs out, some pointers in `beat` stay null.
 void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
 
-// Releases everything the context owns, the lock and the condition, but not the context itself.
+// Releases the lock, the condition and all that the context owns, but not the context itself.
 void __tavo_deinit(TAVO_BEAT_CTX *beat);
 
 // Fills matrix[bin][band] for the lower nfft / 2 bins with the weights of `nbands` triangular
@@ -66,9 +66,9 @@ void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float *
 // Divides the first `count` samples of `view` by its full scale and stores the results in `scaled`.
 void scale_samples(sample_view view, int64_t count, double *scaled);
 
-// Implements __beat_init. Jobs read `ana` directly and pass false for with_signal: then `signal`
-// and rise_flags, which would take 12 bytes per sample, stay null. Returns false if memory runs out
-// for any other field.
+// Implements __beat_init. If with_signal is false, `signal` and rise_flags (12 bytes per sample)
+// stay null; jobs pass false, because they read `ana` directly. Returns false if the lock or any
+// other field cannot be allocated.
 bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat);
 
 // Returns the length of the analysis signal in samples, or 0 if `ana` is null.

@@ -63,7 +63,7 @@ outcome find_tempo(TAVO_ONSET_CTX *onset, const TAVO_BEAT_CTX *beat) {
     return going_on;
 }
 
-// Stores the beats in an array of exactly the right size. If nothing was found, it stays null.
+// Stores the beats in an array of exactly the right size. Without beats, the array stays null.
 outcome find_beats(TAVO_ONSET_CTX *onset, TAVO_BEAT_CTX *beat) {
     auto *times = zeroed_items<float>(candidate_capacity(beat));
     if (times == nullptr) return out_of_memory;

@@ -10,9 +10,9 @@
 
 extern "C" {
 
-// Finds the beats, sets the state to finished and returns the number of beats. If a stop was
-// requested before the onset envelope or the tempo was computed, returns 0 and leaves the state
-// unchanged.
+// Finds the beats, sets the state to finished and returns the number of beats. If a stop is
+// requested before the tempo has been computed, or if memory runs out, returns 0 and leaves the
+// state unchanged.
 int32_t getBeatPosition(TAVO_CTX *ctx);
 
 // Releases the beats and the record itself. Null is ignored.

@@ -51,8 +51,8 @@ int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const do
     return accepted;
 }
 
-// Writes the beat times (ms) to `out` and returns their number. thr[F - 1] and the frames of
-// `peaks` must be zeroed.
+// Writes the beat times (ms) to `out` and returns their number. `thr` (an entry per analysis frame
+// except the last) and peaks->frames must be zeroed.
 int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *thr,
                       PEAK_LIST *peaks, float *out) {
     const int64_t count = beat->frame_count > 1 ? beat->frame_count - 1 : 0;
@@ -66,8 +66,8 @@ int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *
     peaks->count = found > 0 ? found : 0;
     std::copy(thr, thr + count, beat->threshold);
 
-    // std::sort does not allocate. qsort may, and if memory runs out, it falls back to an algorithm
-    // that reads out of bounds when a comparator never reports equality.
+    // Unlike qsort, std::sort does not allocate. If memory runs out, qsort falls back to an
+    // algorithm that reads out of bounds with a comparator that never reports equality.
     const int32_t accepted = select_beats(beat, peaks, thr, onset->max_beats, out);
     std::sort(peaks->frames, peaks->frames + peaks->count);
     std::sort(out, out + accepted);
@@ -77,8 +77,8 @@ int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *
     return total;
 }
 
-// Returns the capacity of the peak list: half the analysis frames, because peaks are never
-// adjacent, plus one entry per power rise.
+// Returns the capacity of the peak list: one entry per power rise and one per two analysis frames.
+// Peaks are never adjacent.
 int64_t peak_capacity(const TAVO_BEAT_CTX *beat) {
     return (beat->frame_count > 0 ? beat->frame_count / 2 : 0) + beat->rise_count;
 }

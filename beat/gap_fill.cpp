@@ -3,7 +3,7 @@
 namespace {
 
 constexpr int32_t kPerGap = 5;        // maximum number of beats added in one gap
-constexpr int32_t kEnoughAdded = 45;  // if more than this are added, no further gap is filled
+constexpr int32_t kEnoughAdded = 45;  // no gap is filled after more additions than this
 constexpr float kLongGap = 6.0f;      // seconds; a gap this long is filled at any tempo
 constexpr float kSpansInGap = 3.0f;
 constexpr int32_t kTimeLead = 2;  // a beat's time is two hops after the start of its analysis frame
@@ -34,7 +34,7 @@ value_rank next_largest(const int32_t *candidates, int32_t count, const double *
 }
 
 // Writes the `maxn` strongest candidates, strongest first. If several are equally strong, the first
-// one is written in place of each of them.
+// of them is written as often as there are such candidates.
 int32_t write_strongest(const int32_t *candidates, int32_t count, int32_t maxn, const double *env,
                         int32_t *dst) {
     int32_t written = 0;

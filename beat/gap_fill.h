@@ -21,9 +21,9 @@ int32_t bringMoreBeat(int32_t a, int32_t b, int32_t *dst, const int32_t *peaks, 
                       int32_t maxn, const double *env);
 }
 
-// Adds beats to the gaps in out[count] (seconds, ascending) that are longer than three times `span`
-// or at least six seconds long. Appends up to five peaks per gap to `out`. The list in `peaks` must
-// be ascending. Returns the number of beats added.
+// Fills long gaps between the beats out[count] (seconds, ascending): gaps of more than three times
+// `span`, or of at least six seconds. Appends up to five peaks per gap to `out`. The list in
+// `peaks` must be ascending. Returns the number of beats added.
 int32_t fill_gaps(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, float span, float *out,
                   int32_t count);
 

@@ -14,8 +14,8 @@ constexpr int64_t kRows = 3;  // mel rows that a worker keeps: the current two a
 
 typedef double mel_row[kMelBands];
 
-// A worker of compute_onset_envelope. In its `worker`, the signal, spectrum and mel pointers are
-// null, because it reads the samples through `view` and keeps only the last few mel rows.
+// A worker of compute_onset_envelope. It reads the samples through `view` and keeps only the last
+// few mel rows, so the signal, spectrum and mel pointers of `worker` are null.
 struct group_worker {
     TAVO_ONSET_WORKER worker;
     sample_view view;
@@ -60,7 +60,7 @@ double *create_hann_window(int32_t size) {
     return window;
 }
 
-// Returns the group_worker that contains the record; null for a record passed by a direct caller.
+// Returns the group_worker that contains the record, or null if a direct caller passed the record.
 group_worker *group_record(TAVO_ONSET_WORKER *worker) {
     return worker->signal == nullptr ? reinterpret_cast<group_worker *>(worker) : nullptr;
 }
@@ -163,8 +163,8 @@ double spectral_flux(const double *row, const double *next) {
 }
 
 // Computes the spectral flux of analysis frames `k` to `end` - 1, comparing each with the frame
-// before it. The frame before the worker's first one belongs to another worker, so fill_envelope
-// compares those two.
+// before it. For the worker's first frame, only stores the mel row: the frame before it belongs to
+// another worker, so fill_envelope computes that flux.
 void compute_flux(group_worker *record, int64_t k, int64_t end) {
     for (; k < end; ++k) {
         const double *row = record->rows[k % kRows];
@@ -231,7 +231,7 @@ void fill_worker(const TAVO_BEAT_CTX *beat, sample_view view, int32_t id, int32_
     worker->window = group->window;
 }
 
-// Runs the workers and the side work. Returns true if every worker processed all of its frames.
+// Runs the workers and the side work. Returns true if every worker finished its analysis frames.
 bool run_group(onset_group *group, const side_work *side) {
     worker_slot slots[kBeatWorkers];
     for (int32_t id = 0; id < kBeatWorkers; ++id) {
@@ -243,8 +243,8 @@ bool run_group(onset_group *group, const side_work *side) {
                        [](const group_worker &member) { return member.is_complete; });
 }
 
-// Computes the flux that the workers left out, from each worker's last analysis frame to the first
-// one of the next worker. Then fills env[count] with the flux divided by its standard deviation.
+// Computes the flux that the workers left out: between each worker's last analysis frame and the
+// next worker's first. Then fills env[count] with the flux divided by its standard deviation.
 void fill_envelope(onset_group *group, int64_t count, double *env) {
     for (int32_t id = 0; id + 1 < kBeatWorkers; ++id) {
         const group_worker *member = &group->members[id];

@@ -38,7 +38,7 @@ extern "C" {
 
 // Fills onset_env[0 .. F - 2] on four threads, or leaves it unchanged if memory runs out. Reads
 // only signal, frame_count and mel_matrix (frame_size / 2 rows of 36 weights) from the context.
-// frame_size, a power of two from 2 to 16384, and hop_size are in samples.
+// frame_size and hop_size are in samples; frame_size is a power of two from 2 to 16384.
 void _getOnsetEnvelope(TAVO_BEAT_CTX *beat, int32_t frame_size, int32_t hop_size);
 
 // The thread entry of a worker and its completion handler. Both receive the TAVO_ONSET_WORKER.

@@ -38,8 +38,8 @@ double level_db(int32_t level) {
     return 20.0 * log10((level < kLevelFloor ? kLevelFloor : level) / kFullScale);
 }
 
-// Computes the sum of the ten squares around each of `count` samples, starting at `first`, and
-// passes the sums to `use` in pairs. `count` must be even. The order of the additions is fixed.
+// For each of the `count` samples from `first` on, computes the sum of the ten squares around it.
+// Passes the sums to `use` in pairs. `count` must be even. The order of the additions is fixed.
 template <typename Use>
 void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
     double squares[kChunk + 2 * kSumRadius] = {};
@@ -64,16 +64,16 @@ int32_t level_of(double sum) {
     return mean < kTopLevel ? static_cast<int32_t>(mean) : kTopLevel;
 }
 
-// Returns the level of a sample: its own level or the decayed level of an earlier peak, whichever
-// is larger. *decayed holds the latter and is updated for the next sample.
+// Returns the level of a sample: the level of its sum or *decayed, whichever is larger. *decayed is
+// the decayed level of an earlier peak; it is updated for the next sample.
 int32_t follow_level(double sum, int32_t *decayed) {
     const int32_t level = std::max(level_of(sum), *decayed);
     *decayed = level - level / kDecay;
     return level;
 }
 
-// Returns the number of samples until a level has decayed to `bottom`, or below kLevelFloor, where
-// it no longer has an effect.
+// Returns the number of samples until `level` has decayed to `bottom` or below kLevelFloor. A level
+// below kLevelFloor no longer has an effect.
 constexpr int64_t samples_to_decay(int32_t level, int32_t bottom) {
     int64_t count = 0;
     for (; level > bottom && level >= kLevelFloor; level -= level / kDecay) ++count;
@@ -94,7 +94,7 @@ int32_t find_decayed_level(sample_view view, int64_t b, int64_t count) {
     return decayed;
 }
 
-// Returns the largest level in block `b`, ignoring NaNs and peaks that decay from the block before.
+// Returns the level of the largest sum in block `b`. Ignores NaNs and decaying earlier peaks.
 int32_t largest_level(sample_view view, int64_t b) {
     const int64_t first = b == 1 ? kSumRadius : (b - 1) * kBlock + 1;
     double_pair most = {0.0, 0.0};
@@ -103,8 +103,8 @@ int32_t largest_level(sample_view view, int64_t b) {
     return level_of(std::max(most[0], most[1]));
 }
 
-// Fills blocks->db. The largest level of a block comes either from its largest sum or from a peak
-// that decays from the previous block, so each block needs only one conversion to decibels.
+// Fills blocks->db. The largest level of a block comes from its largest sum or from a decaying peak
+// of the previous block, so each block needs only one conversion to decibels.
 void measure_blocks(block_levels *blocks, int64_t n) {
     std::fill_n(blocks->db, blocks->count + kLookAhead, kUnmeasured);
     int32_t largest_before = 0;
@@ -116,9 +116,9 @@ void measure_blocks(block_levels *blocks, int64_t n) {
     }
 }
 
-// Returns the first sample from (b - 1) * kBlock to b * kBlock whose level reaches `target`, or -1
-// if none does. `b` is at least 2. The samples at both ends are judged by the largest level of
-// their block instead of their own.
+// Of the samples (b - 1) * kBlock to b * kBlock, returns the first whose level reaches `target`, or
+// -1 if none does. `b` is at least 2. For the first and the last of these samples, the largest
+// level of their block counts instead of their own.
 int64_t find_sample(const block_levels *blocks, int64_t b, double target) {
     const int64_t start = (b - 1) * kBlock;
     if (blocks->db[b - 1] >= target) return start;
@@ -145,7 +145,7 @@ double mean_ahead(const double *db) {
 }
 
 // True if a rise starts in the block whose level is db[0]. An unmeasured block never qualifies: it
-// can exceed `loud` only if p60 is kUnmeasured as well, and then no earlier block can be quieter.
+// can exceed `loud` only if p60 is kUnmeasured as well, and then no earlier block is quiet enough.
 bool starts_rise(const double *db, double mean, const rise_limits *limits) {
     const double step = mean - kMeanStep;
     const double quiet = step < limits->mid ? step : limits->mid;

@@ -21,7 +21,7 @@ struct period_candidate {
 };
 
 // Finds the lag with the best score, which combines the correlation at the lag and at twice the
-// lag. The score must exceed 0; if several are equal, the shortest lag wins.
+// lag. The score must exceed 0; if several lags have the best score, the shortest wins.
 period_candidate best_of_two(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 2; ++k) {
@@ -31,7 +31,7 @@ period_candidate best_of_two(const double *r, int32_t lags) {
     return best;
 }
 
-// Does the same for each lag and three times the lag.
+// Same as best_of_two, but uses three times the lag instead of twice the lag.
 period_candidate best_of_three(const double *r, int32_t lags) {
     period_candidate best = {0.0, 0};
     for (int32_t k = 1; k < lags / 3; ++k) {
@@ -63,8 +63,8 @@ void weigh_lags(double *r, int32_t lags, double hop) {
     }
 }
 
-// Replaces the excerpt in re[nfft] with its circular autocorrelation at lags 0 to `lags` - 1, which
-// repeats every `nfft` entries.
+// Replaces the excerpt in re[nfft] with its autocorrelation at lags 0 to `lags` - 1. The
+// autocorrelation is circular: it repeats every `nfft` entries.
 int32_t autocorrelate(double *re, double *im, int64_t nfft, int32_t count, int32_t lags) {
     if (tavo_dft(re, im, nfft, count, 1) != 0) return TAVO_ERR_MEMORY;
     for (int64_t k = 0; k < nfft; ++k) re[k] = re[k] * re[k] + im[k] * im[k];
@@ -83,8 +83,8 @@ int64_t transform_size(int64_t count) {
 }
 
 // Returns the beat period of x[count] in analysis frames, 0 if no period stands out, or
-// TAVO_ERR_MEMORY. A single NaN (from silent input) would make every correlation NaN, so the
-// transforms are then skipped.
+// TAVO_ERR_MEMORY. A single NaN (from silent input) would make every correlation NaN, so such input
+// is not transformed.
 int32_t find_period(const double *x, int64_t nfft, int32_t lags, int32_t count, double hop) {
     for (int32_t i = 0; i < count; ++i) {
         if (!std::isfinite(x[i])) return 0;

@@ -62,8 +62,8 @@ void slide_window(TAVO_THRES_WORKER *worker, double *win) {
     }
 }
 
-// Computes a worker's range of the threshold. If memory runs out, clears the record's `thr`, which
-// run_workers checks.
+// Computes a worker's range of the threshold. If memory runs out, sets the record's `thr` to null
+// so that run_workers can report it.
 void run_thres_worker(void *record) {
     auto *worker = static_cast<TAVO_THRES_WORKER *>(record);
     if (worker->first > worker->last || worker->window < 1) return;
@@ -76,9 +76,9 @@ void run_thres_worker(void *record) {
     free(win);
 }
 
-// Divides the indices that have a full window into four equal ranges. If no index has one, all
-// ranges are empty. An index on a boundary belongs only to the earlier worker so that no two
-// threads write the same value.
+// Divides the indices that have a full window into four equal ranges. If no index has a full
+// window, all ranges are empty. An index on a boundary belongs only to the earlier worker so that
+// no two threads write the same value.
 void fill_workers(const TAVO_BEAT_CTX *beat, int32_t window, double *thr,
                   TAVO_THRES_WORKER *workers, int32_t *done) {
     const int64_t count = beat->frame_count - 1;
@@ -130,8 +130,8 @@ void ramp_tail(double *thr, int64_t count, int32_t window, double top) {
     }
 }
 
-// Fills the part before the first full window: each index gets the percentile of the values in the
-// second around it, and the first half second stays 0. A short signal may cut that second short.
+// Fills the part before the first full window. Each index gets the percentile of a one-second
+// window around it, which the end of a short signal may cut off. The first half second stays 0.
 void fill_head(const TAVO_BEAT_CTX *beat, int32_t window, int32_t second, double *thr,
                double *scratch) {
     const int64_t count = beat->frame_count - 1;

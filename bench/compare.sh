@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # bench/compare.sh [-n PAIRS] [-m MODE] FILE...
 # Compares a complete analysis of each file with decoding the same file with ffmpeg. Runs the two alternately, in pairs,
-# and prints a Markdown table of the medians of wall time, processor time and peak memory, and of the ratios within the
-# pairs. Uses build/release/bin/tavo, or the command that TAVO names. Close other programs first; on a busy machine,
-# rely only on the ratios of processor time.
+# and prints a Markdown table of medians: wall time, processor time, peak memory, and the ratios within the pairs. Uses
+# build/release/bin/tavo, or the command that TAVO names. Close other programs first; on a busy machine, rely only on
+# the ratios of processor time.
 set -euo pipefail
 tavo=${TAVO:-$(dirname -- "${BASH_SOURCE[0]}")/../build/release/bin/tavo}
 exec python3 - "$tavo" "$@" <<'END'

@@ -22,7 +22,7 @@ inline bool scale_size(int64_t value, int64_t factor, int64_t divisor, int64_t *
 }
 
 // Computes the size in bytes of PCM that lasts `units` (100 ns each) at `rate` (Hz). The division
-// is the last step, so the size may be odd. Returns false as scale_size does.
+// is the last step, so the size may be odd. Returns false in the same cases as scale_size.
 inline bool span_bytes(int64_t units, int32_t rate, int64_t *bytes) {
     return scale_size(units, rate * kBytesPerSample, kUnitsPerSecond, bytes);
 }
@@ -42,9 +42,9 @@ T *zeroed_items(int64_t count) {
     return static_cast<T *>(calloc(static_cast<size_t>(items), sizeof(T)));
 }
 
-// is_incomplete returns true if a job has lost part of its audio or of its search, because a read
-// or an allocation failed. tavo_decode_init clears the mark. The mark is process-wide, because only
-// one instance may exist.
+// is_incomplete returns true if a failed read or allocation made a job skip part of the audio or of
+// the search. tavo_decode_init clears the mark. The mark is process-wide, because only one instance
+// may exist.
 bool is_incomplete();
 void mark_incomplete();
 void clear_incomplete();
@@ -58,7 +58,7 @@ inline void *note_shortage(void *memory) {
 constexpr int64_t kLargeBytes = 4 << 20;  // the functions below pay off from this size on
 
 // Asks for huge pages for a large buffer, which must not have been filled yet. A single page fault
-// then replaces 512 and takes a fifth of the time. The system may ignore the request.
+// then replaces 512 faults and takes a fifth of their time. The system may ignore the request.
 void advise_huge_pages(void *buffer, int64_t bytes);
 
 // Allocates at least one byte of uninitialised memory. The caller frees it. A large buffer starts

@@ -3,8 +3,8 @@
 //
 // A group has one record per worker. The workers share a mutex, a condition and an array of done
 // flags. A worker's thread entry calls run_worker, and its completion handler calls
-// worker_group_done. The starting thread calls worker_group_run, which waits for all flags and
-// joins every thread. Only then does it read the results.
+// worker_group_done. Another thread calls worker_group_run, which waits for all flags and joins
+// every worker. The results are complete when it returns.
 #ifndef TAVO_COMMON_WORKER_GROUP_H
 #define TAVO_COMMON_WORKER_GROUP_H
 
@@ -45,7 +45,7 @@ void worker_group_run(const worker_slot *slots, int32_t count, pthread_mutex_t *
 // pointers null.
 int32_t worker_lock_create(pthread_mutex_t **mutex, pthread_cond_t **cond);
 
-// Destroys and frees both and sets the pointers to null. Null pointers are skipped.
+// Destroys and frees the mutex and the condition and sets both pointers to null. Null is ignored.
 void worker_lock_release(pthread_mutex_t **mutex, pthread_cond_t **cond);
 
 #endif

@@ -25,7 +25,7 @@ bool is_instance(const TAVO_CTX *ctx);
 // True if the job has set its final state.
 bool has_ended(const TAVO_CTX *ctx);
 
-// True if the mode includes the beats or the highlight, respectively. Both are false for values
+// True if the mode includes the beats or the highlight, respectively. Both return false for values
 // outside 0 to 2.
 inline bool finds_beats(int32_t mode) {
     return mode == TAVO_MODE_BEATS || mode == TAVO_MODE_BOTH;

@@ -16,7 +16,7 @@ extern pthread_mutex_t tavo_mutex;
 extern pthread_cond_t tavo_cond;
 
 // Sets the stop flag and waits until the job has ended; its callback may still be running. The
-// caller must not hold tavo_mutex. Returns TAVO_OK, immediately if no job was started, or
+// caller must not hold tavo_mutex. Does not wait if no job was started. Returns TAVO_OK, or
 // TAVO_ERR_HANDLE if `ctx` is not an instance.
 int32_t _tavo_quit(TAVO_CTX *ctx);
 

@@ -97,8 +97,8 @@ void run_stage(const spectrum<T> &x, size_t half, size_t size, const TAVO_FFT_CT
     }
 }
 
-// Runs two consecutive stages on four elements at a time, which stay in registers in between.
-// `half` is the distance between the two inputs of a butterfly in the first stage.
+// Runs two consecutive stages on four elements at a time, which stay in registers between the
+// stages. `half` is the distance between the two inputs of a butterfly in the first stage.
 template <typename T>
 void run_two_stages(const spectrum<T> &x, size_t half, size_t size, const TAVO_FFT_CTX *ctx) {
     const size_t stride = size / (4 * half);  // step between the second stage's twiddle factors

@@ -50,8 +50,8 @@ struct frame_pair {
 };
 
 // Fills powers[n / 2] with the powers of the lower n / 2 bins of two windowed frames. Each power is
-// rounded to single precision and bit-identical to the one that tavo_fft_proc gives for that frame
-// alone. `n` is the size passed to tavo_fft_init. scratch[2 * n] is overwritten.
+// rounded to single precision. It is bit-identical to the power computed by transforming its frame
+// alone with tavo_fft_proc. `n` is the size passed to tavo_fft_init. scratch[2 * n] is overwritten.
 void compute_frame_powers(const frame_pair &frames, int32_t n, const TAVO_FFT_CTX *ctx,
                           double_pair *scratch, double_pair *powers);
 

@@ -46,7 +46,7 @@ Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
 
 // Suppresses the positions within `radius` of `index`. Larger peaks in that range are already
 // suppressed: had one survived, it would have suppressed this peak. Survivors are more than
-// `radius` apart, so all calls together mark each position at most three times.
+// `radius` apart, so all calls together mark each position at most twice.
 void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius) {
     if (radius < 0) return;
     const int64_t begin = index > radius ? index - radius : 0;

@@ -30,7 +30,7 @@ int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_
 // how many it wrote.
 int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out);
 
-// First writes the peak nearest to each priority position, unless that is the last peak. Then
+// For each priority position, first writes the nearest peak, unless that is the last one. Then
 // writes the other peaks, largest first, dropping each one closer than min_dist to a peak already
 // written. `out` has n_priority + len / 2 entries. Returns the number of peaks written, or -1 if
 // min_dist is 0.

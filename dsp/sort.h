@@ -1,5 +1,5 @@
-// Comparators for qsort, which never report equality, and an in-place quicksort of doubles. Used by
-// dsp/peaks.h and, to sort block levels, by beat/power_rise.h.
+// Comparators for qsort and an in-place quicksort of doubles. The comparators never report
+// equality. Used by dsp/peaks.h and beat/power_rise.h.
 #ifndef TAVO_DSP_SORT_H
 #define TAVO_DSP_SORT_H
 

@@ -3,7 +3,7 @@
 
 Compares the beats that tavo finds with a reference annotation: a text file with one time in seconds per
 line. Prints precision, recall and F-measure at 70 ms, computed by mir_eval (Debian: python3-mir-eval).
-With PICTURE, also draws both lists to that file, which needs matplotlib.
+With PICTURE, also draws both lists to that file; this needs matplotlib.
 """
 import sys
 

@@ -9,8 +9,8 @@
 
 extern "C" {
 
-// Returns the start of the highlight in milliseconds, or 0 if the PCM is shorter than 6 s, and
-// stores it in hl.hl_pos.
+// Stores the start of the highlight (ms) in hl.hl_pos and returns it. The start is 0 if the PCM is
+// shorter than 6 s.
 uint32_t getHLPosition(TAVO_CTX *ctx);
 
 // Releases the loudness curve and the context itself. Null is ignored.

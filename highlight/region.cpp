@@ -51,8 +51,8 @@ int32_t valley_before(const song_curve *song, int32_t chosen) {
     return k - 1;
 }
 
-// True if the loudness at `idx` is below `last` and the mean of the second and the third point
-// after it is below the mean of the song. False if these points are past the end of the song.
+// True if the loudness at `idx` is below `last` and the mean loudness at idx + 2 and idx + 3 is
+// below the mean of the song. False if idx + 3 is past the end of the song.
 bool is_drop(const song_curve *song, int32_t idx, float last) {
     if (!(song->norm[idx] < last) || idx + 3 >= song->n) return false;
     return (song->norm[idx + 2] + song->norm[idx + 3]) * 0.5f < song->mean;

@@ -53,8 +53,8 @@ bool is_less(float a, float b) {
     return a < b;
 }
 
-// Finds the largest value and the 60th percentile. Returns false if memory runs out. std::sort does
-// not allocate; qsort may, and its fallback needs a comparator that can report equality.
+// Finds the largest value and the 60th percentile. Returns false if memory runs out. Uses
+// std::sort, which does not allocate; qsort may.
 bool rank_curve(const float *power, int32_t n, float *largest, float *percentile) {
     const auto count = static_cast<size_t>(n);
     auto *sorted = static_cast<float *>(note_shortage(malloc(count * sizeof(float))));
@@ -93,7 +93,7 @@ int32_t valley_distance(const search_state *s, int32_t pos) {
     return 0;
 }
 
-// True if `pos` is outside the tail and in a loud segment that lasts long enough after it.
+// True if `pos` is outside the tail, in a loud segment and at least kMinLoudAfter from its end.
 bool is_in_segment(const search_state *s, int32_t pos) {
     if (pos > s->n - s->tail) return false;
     for (int32_t k = 0; k < s->nseg; ++k) {
@@ -129,8 +129,8 @@ int32_t score_edges(const search_state *s) {
     return best_pos != 0 ? best_pos : second_pos;
 }
 
-// Returns the point after the first edge that leads to a loud point, or after the last edge if none
-// does.
+// Returns the point after the first edge that leads to a loud point. If no edge does, returns the
+// point after the last edge.
 int32_t first_loud_edge(const search_state *s) {
     int32_t pos = 0;
     for (int32_t k = 0; k < s->edges; ++k) {
@@ -147,8 +147,8 @@ int32_t choose_edge(const search_state *s) {
     return scored != 0 ? scored : first_loud_edge(s);
 }
 
-// Returns the start of the first loud segment or the first valley, whichever comes first. It is the
-// highlight start if a region of the requested length from there reaches the end of the song.
+// Returns the start of the first loud segment or the first valley, whichever comes first. This is
+// the highlight start if a region of the requested length that starts there reaches the song's end.
 int32_t fallback_point(const search_state *s) {
     const int32_t start = s->nseg > 0 ? s->start[0] : 0;
     const int32_t valley = s->nv > 0 ? s->valley[0] : 0;

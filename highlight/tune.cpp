@@ -43,8 +43,8 @@ void measure_frames(const int16_t *pcm, const frame_plan *frames, float *power) 
     }
 }
 
-// Returns the index of the window before the largest rise, the first if several are equal, or -1 if
-// no rise exceeds kMinRise.
+// Returns the index of the window before the largest rise, or before the first of several equal
+// ones. Returns -1 if no rise exceeds kMinRise.
 int64_t largest_rise(const float *power, int64_t count) {
     int64_t best = -1;
     float best_rise = kMinRise;

@@ -33,7 +33,7 @@
  * The library does not analyse two files at a time in one process, take audio from memory, or
  * report progress. To analyse several files at once, use several processes.
  *
- * States of an instance, and what each call returns in it:
+ * The states of an instance, and what each call does and returns in each state:
  *
  * | state      | tavo_analyze | tavo_deinit                                                     |
  * |------------|--------------|-----------------------------------------------------------------|
@@ -101,7 +101,7 @@ enum {
     TAVO_LOUDNESS_WINDOW_MS = 6000 /**< length of a window */
 };
 
-/** Margins of the highlight search: values at the ends of the curve that are not searched. */
+/** Margins of the highlight search: how many values it skips at each end of the curve. */
 enum {
     TAVO_SHORT_SONG_S = 90,     /**< seconds; shorter songs have narrower margins */
     TAVO_SEARCH_SKIP = 9,       /**< values at the start; 0 in a short song */
@@ -157,14 +157,14 @@ typedef void (*TAVO_LISTENER)(TAVO_INFO *info, void *user);
  * - -255: the codec library failed. */
 int32_t tavo_probe(const char *path, TAVO_STREAM *stream);
 
-/** Returns an English clause for a return code, without a final period: "the file cannot be
+/** Returns an English clause for a return code, without a final period, such as "the file cannot be
  * opened or has no audio stream". Never null; the string is static. */
 const char *tavo_error_text(int32_t code);
 
 /** Opens the file, reads its format and plans the decoding.
  *
- * Only one instance may exist in a process, and the caller must ensure this: a second tavo_init
- * before the tavo_deinit of the first succeeds, but the two share their locks and may wait forever.
+ * Only one instance may exist in a process; the caller must ensure this. A second tavo_init
+ * succeeds while the first instance exists, but both then share their locks and may wait forever.
  *
  * Returns the instance, owned by the caller until tavo_deinit, with *err 0. On failure returns
  * null, releases everything, and sets *err to -2 (out of memory) or -4 (the file cannot be used,
@@ -178,7 +178,7 @@ void tavo_setcallback(TAVO_CTX *ctx, TAVO_CALLBACK callback);
 /** Stores a listener instead of a callback, and a pointer that is passed to the listener but not
  * otherwise used. Call it before tavo_analyze, on an instance that tavo_init returned. The last
  * call to tavo_setcallback or tavo_set_listener takes effect. A null listener removes the stored
- * one. Returns 0, or -4 for a bad handle, with nothing stored. */
+ * one. Returns 0. For a bad handle, stores nothing and returns -4. */
 int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 
 /** Starts the one job of the instance on its own thread and returns immediately.
@@ -192,38 +192,37 @@ int32_t tavo_set_listener(TAVO_CTX *ctx, TAVO_LISTENER listener, void *user);
 int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_beats, int32_t beat_param2);
 
 /** Stops a running job, waits until its callback has returned, and releases the instance. Decoding
- * and the highlight search run to completion before the job stops.
- * Returns 0, or -4 for a bad handle or a call from inside the callback, with nothing changed. */
+ * and the highlight search run to completion before the job stops. Returns 0. For a bad handle or
+ * inside the callback, changes nothing and returns -4. */
 int32_t tavo_deinit(TAVO_CTX *ctx);
 
-/** Stores the stream's sample rate in Hz, the channels of the decoder's output, and the duration
- * in ms that the file states. Null pointers are skipped. Valid after tavo_init. Returns 0, or -4
- * for a bad handle, with nothing written. */
+/** Stores the stream's sample rate in Hz, the channels of the decoder's output, and the duration in
+ * ms that the file states. Null pointers are skipped. Valid after tavo_init. Returns 0. For a bad
+ * handle, writes nothing and returns -4. */
 int32_t tavo_get_stream(const TAVO_CTX *ctx, int32_t *rate, int32_t *channels,
                         int64_t *duration_ms);
 
-/** Returns the tempo in beats per minute, 30 to 200, once a job of mode 1 or 2 has succeeded;
- * call it in the callback or after it. In mode 2 it is the tempo of the music from the
- * highlight on. Returns 0 before the end of the job, after a failure, in mode 0, or for a bad
- * handle. */
+/** Returns the tempo in beats per minute, 30 to 200, once a job of mode 1 or 2 has succeeded; call
+ * this function in the callback or later. In mode 2 it is the tempo of the music from the highlight
+ * on. Returns 0 before the end of the job, after a failure, in mode 0, or for a bad handle. */
 int32_t tavo_get_tempo(const TAVO_CTX *ctx);
 
-/** Returns 1 if the job decoded any audio; call it in the callback or after it. Without audio, a
- * highlight at 0 is not a result. Returns 0 before the end of the job, if nothing was decoded,
- * or for a bad handle. */
+/** Returns 1 if the job decoded any audio; call this function in the callback or later. Without
+ * audio, a highlight at 0 is not a result. Returns 0 before the end of the job, if nothing was
+ * decoded, or for a bad handle. */
 int32_t tavo_has_audio(const TAVO_CTX *ctx);
 
-/** Returns 1 if the job decoded the file to its end; call it in the callback or after it. Returns
- * 0 if the file could not be read to its end or memory ran out; the result then covers only what
- * was analysed. Also returns 0 before the end of the job and for a bad handle. */
+/** Returns 1 if the job decoded the file to its end; call this function in the callback or later.
+ * Returns 0 if the file could not be read to its end or memory ran out; the result then covers only
+ * what was analysed. Also returns 0 before the end of the job and for a bad handle. */
 int32_t tavo_is_complete(const TAVO_CTX *ctx);
 
-/** Returns the loudness curve of the file, once a job of mode 0 or 2 has ended. Value i is
- * measured over the window that starts at i * TAVO_LOUDNESS_HOP_MS. It is 10 * log10(m + 1),
- * where m is the mean square of the samples if full scale is 1.0. This gives 0 for silence and
- * 3.01 for a full-scale square wave. The curve has *count values and is valid until tavo_deinit.
- * Returns null with *count 0 before the end of the job, in mode 1, for audio shorter than a
- * window, or for a bad handle. count must not be null. */
+/** Returns the loudness curve of the file, once a job of mode 0 or 2 has ended. Value i is measured
+ * over the window that starts at i * TAVO_LOUDNESS_HOP_MS. It is 10 * log10(m + 1), where m is the
+ * mean square of the samples, with full scale 1.0. This gives 0 for silence and 3.01 for a
+ * full-scale square wave. The curve has *count values and is valid until tavo_deinit. Returns null
+ * with *count 0 before the end of the job, in mode 1, for audio shorter than a window, or for a bad
+ * handle. count must not be null. */
 const float *tavo_get_loudness(const TAVO_CTX *ctx, int32_t *count);
 
 /** An open file whose samples are read from start to end. Its fields are private. */
@@ -240,16 +239,16 @@ typedef struct mtsrc_frame {
     int32_t size; /**< receives the number of bytes delivered */
 } mtsrc_frame;
 
-/** Opens a file to read its samples, for instance to draw them; an analysis does not need it.
+/** Opens a file to read its samples, for instance to draw them; an analysis does not need this.
  * Returns a handle, which the caller releases with mtsrc_deinit, with *err 0. On failure returns
  * null and sets *err: -2 out of memory; -3 unknown or unsupported format, or path too long; -4 no
  * path; -6 file unreadable or shorter than 16 bytes; -7 file cannot be opened, or has no usable
  * audio; -255 the codec library failed. */
 mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err);
 
-/** Delivers `want` bytes; up to 917,506 bytes always fit. Returns 0 if it delivered all of them; 1
- * if the stream ended, with the remaining bytes delivered; -2 if memory ran out; -4 for a bad
- * handle or frame, or if `want` is negative or too large; -6 if reading or decoding failed. */
+/** Delivers `want` bytes; any count up to 917,506 is allowed. Returns 0 if it delivered all of
+ * them; 1 if the stream ended, with the remaining bytes delivered; -2 if memory ran out; -4 for a
+ * bad handle or frame, or if `want` is negative or too large; -6 if reading or decoding failed. */
 int32_t mtsrc_getstream(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame);
 
 /** Releases everything. Returns -5 on success, -4 for a bad handle. */

@@ -233,7 +233,7 @@ jint attach_thread(Vm *vm, jint (Vm::*attach)(Env **, void *), JNIEnv **env) {
     return result;
 }
 
-// Returns the environment of this thread, which is attached if necessary, or null on failure.
+// Attaches this thread if necessary. Returns its environment, or null on failure.
 JNIEnv *environment(JavaVM *vm, bool *attached_here) {
     void *current = nullptr;
     if (vm->GetEnv(&current, JNI_VERSION_1_6) == JNI_OK) return static_cast<JNIEnv *>(current);

@@ -26,10 +26,10 @@ JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *vm, void *reserved);
 JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobject thiz,
                                                               jobject obj);
 
-// Opens a file. Returns TAVO_OK; TAVO_ERR_BUSY, with nothing changed, if an instance already
-// exists, whatever the path; TAVO_ERR_MEMORY; or TAVO_ERR_HANDLE if the path is null, the file
-// cannot be used, or the class lacks postEventFromNative. After the last two errors, no instance
-// exists.
+// Opens a file. If an instance already exists, changes nothing and returns TAVO_ERR_BUSY, whatever
+// the path. Otherwise returns TAVO_OK, or an error after which no instance exists: TAVO_ERR_HANDLE
+// if the path is null, the file is unusable or the class lacks postEventFromNative; or
+// TAVO_ERR_MEMORY.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject thiz, jstring path,
                                                      jint mode);
 
@@ -48,8 +48,8 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_disableClickTrack(JNIEnv *env, j
 // True if the job of the open instance decoded the file to its end (tavo_is_complete).
 JNIEXPORT jboolean JNICALL Java_com_kestu_tavo_Tavo_isComplete(JNIEnv *env, jobject thiz);
 
-// Static. Returns the reason why a file cannot be analysed (tavo_probe) in words, or null if it can
-// be.
+// Static. Returns the reason why a file cannot be analysed (tavo_probe) in words. Returns null if
+// the file can be analysed.
 JNIEXPORT jstring JNICALL Java_com_kestu_tavo_Tavo_reason(JNIEnv *env, jclass host, jstring path);
 
 // The callback of the bridge's instances. Posts exactly one event: (object, 1, hl_pos, beat_count,

@@ -18,7 +18,7 @@ struct offset_range {
 };
 
 // Return the lowest and the highest offset in the range, respectively, at which `pcm` contains the
-// block, or kNotFound if it does not.
+// block, or kNotFound if there is none.
 int64_t find_lowest(const uint8_t *pcm, offset_range range, const uint8_t *block);
 int64_t find_highest(const uint8_t *pcm, offset_range range, const uint8_t *block);
 

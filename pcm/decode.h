@@ -21,8 +21,8 @@ void *_tavo_mtproc_decoding(void *seg);
 void thd_cleanup(void *seg);
 }
 
-// Same as DecodePcmMT, but `pages` determines what happens to the segments' buffers. Jobs release
-// their pages.
+// Same as DecodePcmMT, but `pages` determines what happens to the segments' buffers. Jobs pass
+// segment_pages::released.
 int64_t decode_segments(TAVO_CTX *ctx, void *dst, int64_t dst_capacity, segment_pages pages);
 
 #endif

@@ -44,9 +44,9 @@ extern pthread_mutex_t *ext_mutex_mt;
 extern pthread_cond_t *ext_cond_mt;
 
 // Plans the decoding of the file: fills fmt, duration, seg, seg_count, pcm and pcm_bytes. Returns
-// 0; TAVO_ERR_MEMORY; TAVO_ERR_FORMAT if the stream is unusable, lasts 1 s or less, or has a rate
-// below 8000 Hz; TAVO_ERR_HANDLE if the file cannot be opened; or the error code of a segment's
-// source. On failure, releases everything.
+// 0. On failure, releases everything and returns an error: TAVO_ERR_MEMORY; TAVO_ERR_FORMAT if the
+// stream is unusable, lasts 1 s or less, or has a rate below 8000 Hz; TAVO_ERR_HANDLE if the file
+// cannot be opened; or the code of a segment's source.
 int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param);
 
 // Releases the segment table with its sources and buffers, the PCM buffer, the lock and the
@@ -60,8 +60,8 @@ void tavo_decode_deinit(TAVO_CTX *ctx);
 int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
 }
 
-// Returns TAVO_OK if the stream can be analysed; otherwise TAVO_ERR_SHORT, TAVO_ERR_LOW_RATE, or
-// TAVO_ERR_FORMAT if its byte count overflows.
+// Returns TAVO_OK if the stream can be analysed. Otherwise returns TAVO_ERR_SHORT,
+// TAVO_ERR_LOW_RATE or, if the byte count overflows, TAVO_ERR_FORMAT.
 int32_t check_stream(const mtsrc_format &format);
 
 #endif

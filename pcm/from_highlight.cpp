@@ -14,8 +14,8 @@ namespace {
 constexpr int64_t kFirstSeekMs = 1001;  // any earlier highlight counts as the start of the file
 constexpr float kMsPerSecond = 1000.0f;
 
-// The probe is PCM decoded from the seek position. The block to search for starts late enough in it
-// for a decoder to have settled after the seek.
+// The probe is PCM decoded from the seek position. The block to search for starts so late in the
+// probe that the decoder has settled after the seek.
 constexpr int64_t kProbeBytes = 8192;
 constexpr int64_t kProbeBlockOffset = 4608;
 
@@ -31,8 +31,8 @@ offset_range search_range(int64_t expected, int32_t rate, int64_t pcm_bytes) {
     const int64_t second = std::max<int64_t>(second_bytes(rate), 0);
     const int64_t before = second * kSecondsBefore;
     const int64_t after = second * kSecondsAfter;
-    // With a lower offset, the seek position would be before the start of the buffer. None of these
-    // sums can overflow.
+    // An offset below kProbeBlockOffset would put the seek position before the start of the buffer.
+    // None of these sums can overflow.
     const int64_t first =
         expected < before + kProbeBlockOffset ? kProbeBlockOffset : expected - before;
     const int64_t end = expected > pcm_bytes - after ? pcm_bytes : expected + after;
@@ -40,8 +40,8 @@ offset_range search_range(int64_t expected, int32_t rate, int64_t pcm_bytes) {
 }
 
 // Looks in `pcm` for the audio that the source delivers next. On entry, *off is the byte offset
-// where it is expected. Returns 0 and sets *off to the offset found; if it is not found, returns -1
-// and leaves *off unchanged.
+// where that audio is expected. If it is found, sets *off to its offset and returns 0; otherwise
+// returns -1.
 int32_t find_next_audio(mtsrc_ctx *src, int32_t rate, const int16_t *pcm, int64_t pcm_bytes,
                         int64_t *off) {
     auto *probe = static_cast<uint8_t *>(malloc(kProbeBytes));
@@ -88,8 +88,8 @@ int32_t decode_again(TAVO_CTX *ctx, int64_t start, segment_pages pages) {
     return 0;
 }
 
-// Seeks to `pos` (milliseconds) and stores the position that was reached as the highlight. If the
-// position cannot be found in the decoded PCM, decodes again from there. *off receives the number
+// Seeks to `pos` (milliseconds) and sets hl_pos to the position that was reached. If that position
+// cannot be found in the decoded PCM, decodes the stream again from there. *off receives the number
 // of bytes of `pcm` before the position.
 int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t *off) {
     mtsrc_ctx *src = ctx->seg[0].src;
@@ -110,7 +110,7 @@ int32_t seek_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages, int64_t 
     return decode_again(ctx, reached, pages);
 }
 
-// Converts the PCM after its first `off` bytes to the analysis signal, and frees the PCM.
+// Skips `off` bytes of the PCM, converts the rest to the analysis signal and frees the PCM.
 int32_t convert_rest(TAVO_CTX *ctx, int64_t off) {
     int16_t *pcm = ctx->pcm;
     const int64_t bytes = pcm == nullptr ? 0 : std::max<int64_t>(ctx->pcm_bytes - off, 0);

@@ -1,9 +1,9 @@
 // Mode 2: computes the analysis signal from the highlight on.
 //
-// Input: TAVO_CTX.pcm and a start in milliseconds. Output: ana, ana_len and hl.hl_pos, the start
-// that was actually used; pcm is always released. The PCM is cut at the position that a seek to the
-// start reaches. If that position cannot be found in the PCM, the stream is decoded again from
-// there. Follows highlight/position.h and precedes beat/beats.h.
+// Input: TAVO_CTX.pcm and a start in milliseconds. Output: ana and ana_len, and in hl.hl_pos the
+// start that was actually used. `pcm` is always released. The PCM is cut at the position that a
+// seek to the start reaches. If that position cannot be found in the PCM, the stream is decoded
+// again from that position. Follows highlight/position.h and precedes beat/beats.h.
 #ifndef TAVO_PCM_FROM_HIGHLIGHT_H
 #define TAVO_PCM_FROM_HIGHLIGHT_H
 
@@ -11,15 +11,15 @@
 
 extern "C" {
 
-// Computes the analysis signal from `pos` (milliseconds) on. Returns 0, TAVO_ERR_MEMORY if the
-// second decoding cannot be planned, or the error code of the conversion. Reads from the source of
-// the first segment; a second decoding reads from all sources.
+// Computes the analysis signal from `pos` (milliseconds) on. Returns 0, or the error code of the
+// conversion. If the stream must be decoded again and that cannot be planned, returns
+// TAVO_ERR_MEMORY. Reads from the first segment's source, or from all sources to decode again.
 int32_t tavo_get_from_here(TAVO_CTX *ctx, int64_t pos);
 
 // Looks in `pcm` for the audio that the segment's source delivers next. On entry, *off is the byte
-// offset where it is expected. Returns 0 and sets *off to the offset found; if it is not found,
-// returns -1 and leaves *off unchanged. Reads only src, fmt, start and duration from the record.
-// The last two determine the size of `pcm`, which is not checked if duration is 0.
+// offset where that audio is expected. If it is found, sets *off to its offset and returns 0;
+// otherwise returns -1. Reads only src, fmt, start and duration from the record. The last three
+// determine the size of `pcm`; if duration is 0, the size is not checked.
 int32_t _compare_decoded(TAVO_DECSEG *seg, const int16_t *pcm, int64_t *off);
 }
 

@@ -1,7 +1,7 @@
 // Reads a media source until a buffer is full.
 //
 // Input: a media source that has been positioned. Output: bytes of 16-bit mono PCM. Called by
-// pcm/decode.cpp to decode a segment and by pcm/from_highlight.cpp to decode the probe at a
+// pcm/decode.cpp to decode a segment and by pcm/from_highlight.cpp to decode some PCM at the
 // highlight.
 #ifndef TAVO_PCM_READ_PCM_H
 #define TAVO_PCM_READ_PCM_H

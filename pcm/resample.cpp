@@ -61,7 +61,7 @@ int32_t run_sinc(const conversion &plan, const int16_t *in, double *out) {
 }
 
 // True if the output may overwrite the input. The interpolator reads all of its input before the
-// output is written. At ratio 4, the samples of a block take as many bytes as their mean.
+// output is written. At ratio 4, the four samples of a block occupy as many bytes as their mean.
 bool works_in_place(const conversion &plan) {
     const int32_t whole = whole_ratio(plan.ratio);
     return plan.n > 0 && (whole == 0 || whole == kMaxWholeRatio);
@@ -69,7 +69,7 @@ bool works_in_place(const conversion &plan) {
 
 // Returns a heap block that is large enough for the output, or null if memory runs out. If *owned
 // is not null and the conversion works in place, the block is *owned, which may be enlarged and
-// moved. Otherwise it is new and zeroed.
+// moved. Otherwise the block is new and zeroed.
 double *allocate_output(const conversion &plan, int16_t **owned) {
     void *memory = nullptr;
     if (*owned != nullptr && works_in_place(plan)) {

@@ -10,10 +10,10 @@
 
 extern "C" {
 
-// Converts the bytes / 2 samples of `pcm`. On success, returns 0 and sets *out to a new array of
-// *out_len doubles, followed by 64 zero bytes; the caller frees it. If memory runs out, a rate is
-// not valid or a size overflows, returns TAVO_ERR_MEMORY and sets *out to null and *out_len to 0.
-// The interpolator ignores input past 2^31 - 1 samples, and the output for it is 0.
+// Converts `pcm`, which has bytes / 2 samples. On success, returns 0 and sets *out to a new array
+// of *out_len doubles, followed by 64 zero bytes; the caller frees it. If memory runs out, a rate
+// is not valid or a size overflows, returns TAVO_ERR_MEMORY and sets *out to null and *out_len to
+// 0. The interpolator ignores input past 2^31 - 1 samples; the output for that input is 0.
 int32_t dorn_resampler_run(const int16_t *pcm, int64_t bytes, int32_t source_rate, int32_t ana_rate,
                            int64_t *out_len, double **out);
 }

@@ -15,8 +15,8 @@ namespace {
 constexpr int32_t kParts = 4;
 constexpr int32_t kExactFloats = 1 << 24;  // up to here, floats hold whole numbers exactly
 
-// Returns the number of outputs whose blocks have exactly `whole` samples. After them, positions
-// are rounded in single precision.
+// Returns the number of outputs whose blocks have exactly `whole` samples. The positions of later
+// outputs are rounded in single precision.
 int64_t exact_blocks(int32_t whole) {
     return whole == 3 ? kExactFloats / 3 : kExactFloats;
 }
@@ -173,7 +173,7 @@ bool average_on_threads(const int16_t *in, int64_t count, float ratio, double *o
 void resamplePcmMonoMT(const int16_t *in, int64_t count, int32_t source_rate, double *out,
                        int64_t n, int32_t ana_rate) {
     if (source_rate < 1 || ana_rate < 1) return;
-    // A direct caller may not have created the lock.
+    // If the function is called directly, the lock may be missing.
     const bool make_lock = ext_mutex_resample == nullptr;
     if (make_lock && worker_lock_create(&ext_mutex_resample, &ext_cond_resample) != 0) return;
     const float ratio = static_cast<float>(source_rate) / static_cast<float>(ana_rate);

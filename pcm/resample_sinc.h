@@ -27,15 +27,15 @@ int32_t dorn_resampler_prepare(dorn_resampler_state *state, int32_t source_rate,
                                int32_t target_rate, int32_t channels);
 
 // Converts in_len samples, counted over all channels. Returns the number of samples written to
-// `out`, or -1 if an argument is missing or a phase is out of range. Writes nothing if the input is
-// too short for one output frame.
+// `out`, or -1 if a pointer is null, the state is invalid or a phase is out of range. Writes
+// nothing if the input is too short for one output frame.
 int32_t dorn_resampler_convert(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
                                int16_t *out);
 }
 
 // Same as dorn_resampler_convert, but writes at most max_frames output frames. On long inputs, the
-// single-precision position falls so far short that the conversion would otherwise write more than
-// the rates allow.
+// single-precision position falls so far short of the exact one that the conversion would otherwise
+// write more than the rates allow.
 int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
                        int16_t *out, int64_t max_frames);
 

@@ -92,8 +92,8 @@ bool find_inputs(const dorn_resampler_state &state, int64_t j, int32_t in_len, i
     if ((*first)[0] < 1 || (*first)[3] + state.taps >= in_len) return false;
     if (static_cast<double>(half + whole[3]) >= static_cast<double>(in_len)) return false;
 
-    // Positions of 1 or more have at most 23 fractional bits, so the differences are exact. So is
-    // the phase, floor(960 * frac + 480.5), which is computed in units of 2^-17.
+    // Positions of 1 or more have at most 23 fractional bits, so the differences are exact. The
+    // phase, floor(960 * frac + 480.5), is computed in units of 2^-17 and is exact too.
     const float_quad frac = pos - whole - (state.taps % 2 != 0 ? 0.5f : 0.0f);
     if (any_lane(frac > 0.5f)) return false;
     const int_quad bits = __builtin_convertvector(frac * 8388608.0f, int_quad);

@@ -1,8 +1,8 @@
 #!/usr/bin/env bash
 # scripts/coverage.sh
 # Builds with coverage counters, runs the tests and prints how many lines of the library and of the desktop's codec
-# library they executed. Fails below 97 % of the library or 90 % of the codec library. Lists the lines that were not
-# executed in build/coverage/*.txt.
+# library they executed. Fails below 97 % of the library or 90 % of the codec library. Writes build/coverage/*.txt,
+# which list the lines that were not executed.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 bash scripts/setup.sh build tests measure

@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # scripts/fuzz.sh [--keep] SECONDS [TARGET]...
-# Runs each fuzzer (all five by default) for SECONDS. It starts from its corpus (fuzz/corpus/TARGET.tar.gz and
-# fuzz/corpus/TARGET) and, if its inputs are files, from the tests' short songs. An input that takes more than 2 s
-# fails. Stores each failing input in build/fuzz/findings. --keep then replaces the archive with the smallest set
-# of inputs below 6 KiB with the same coverage.
+# Runs each fuzzer TARGET (all five by default) for SECONDS, and stores failing inputs in build/fuzz/findings.
+# An input that takes more than 2 s fails. A fuzzer starts from its corpus (fuzz/corpus/TARGET.tar.gz and
+# fuzz/corpus/TARGET) and, if its inputs are files, from the tests' short songs. --keep then finds a set of inputs with
+# the same coverage and replaces the archive with the smallest of them (60 at most, below 6 KiB each).
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 keep=

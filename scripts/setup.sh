@@ -1,12 +1,5 @@
 #!/usr/bin/env bash
-# scripts/setup.sh [build
-# java
-# tests
-# web
-# cluster
-# fuzz
-# measure
-# package]...
+# scripts/setup.sh [build|java|tests|web|cluster|fuzz|measure|package]...
 # Installs the Debian packages that are missing for the named groups; by default for build, java, tests, web and
 # fuzz. build alone is enough for the library and the command. Prints nothing if no package is missing.
 set -euo pipefail

@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # scripts/test-cluster.sh [BUILD]
-# Runs packaging/cluster/tavo.sbatch on a one-node Slurm cluster with two slots and with a PostgreSQL store. Starts
-# and stops both on the loopback interface. The list has 121 inputs, one of them not audio; one task is killed halfway
-# and requeued. Compares every row with a plain run. Needs root, because Slurm's daemons must run as root and the
-# PostgreSQL server as another user. Run scripts/setup.sh build tests cluster first.
+# Runs packaging/cluster/tavo.sbatch on a one-node Slurm cluster with two slots, with a PostgreSQL store. Starts and
+# stops Slurm and PostgreSQL on the loopback interface. The list has 121 inputs, one of them not audio; one task is
+# killed halfway and requeued. Compares every row with a plain run. Needs root, because Slurm's daemons must run as root
+# and the PostgreSQL server as another user. Run scripts/setup.sh build tests cluster first.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 root=$PWD

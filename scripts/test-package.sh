@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # scripts/test-package.sh
-# For use before a release, as root; takes a quarter of an hour. Builds the Debian packages twice, in two folders,
-# and compares their bytes. Runs lintian. Installs them with apt in a clean Debian 12, runs the command, the Python
-# package and the jar, builds a program, and removes the packages. Runs the command from the .tar.gz. Builds a wheel
-# and installs it in a virtual environment.
+# For use before a release, as root; takes a quarter of an hour. Builds the Debian packages twice, in two folders, and
+# compares their bytes. Runs lintian. Installs the packages with apt in a clean Debian 12, runs the command, the Python
+# package and the jar, builds a program, and purges the packages. Runs the command from the .tar.gz. Builds a wheel and
+# installs it in a virtual environment.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $(id -u) -ne 0 ]]; then

@@ -15,7 +15,7 @@ void store_result(TAVO_INFO *info, void *user) {
     *static_cast<TAVO_INFO *>(user) = *info;  // beat_times is valid until tavo_deinit
 }
 
-// Fills in the record from a finished job: its results or its error.
+// Fills in the record with the results or the error of a finished job.
 void read_result(const TAVO_CTX *ctx, const TAVO_INFO &info, record &result) {
     result.has_highlight = result.mode != TAVO_MODE_BEATS;
     result.hl_pos_ms = info.hl_pos;

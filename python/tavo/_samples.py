@@ -18,8 +18,8 @@ _MAX_BYTES = 0xFFFFFFFF - _HEADER.size
 def to_mono(samples: Samples) -> npt.NDArray[np.int16]:
     """Returns the mean of the channels as 16-bit samples. Floats are clipped to full scale, 1.0.
 
-    samples: shape (n,) or (n, channels), floating-point or int16. Two int16 channels give the samples
-    that the library computes from the same channels in a file.
+    samples: shape (n,) or (n, channels), floating-point or int16. For two int16 channels, the result is
+    bit-identical to the downmix that the library makes of the same channels in a file.
     """
     array: npt.NDArray[Any] = np.asarray(samples)
     if array.ndim not in (1, 2) or array.size == 0:

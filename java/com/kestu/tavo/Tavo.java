@@ -108,7 +108,7 @@ public final class Tavo implements AutoCloseable {
      *     {@link #ERROR_UNUSABLE}
      * @param mode one of the modes above
      * @return 0, {@link #ERROR_BUSY}, {@link #ERROR_MEMORY} or {@link #ERROR_UNUSABLE}; an error
-     *     changes nothing, and {@link #reason} explains it
+     *     changes nothing, and {@link #reason} explains {@link #ERROR_UNUSABLE}
      */
     public native int init(String path, int mode);
 
@@ -119,8 +119,8 @@ public final class Tavo implements AutoCloseable {
      * @param maxBeats maximum number of threshold-selected beats, 0 for no limit; not used in
      *     {@link #MODE_HIGHLIGHT}
      * @param reserved not used, 0
-     * @return 0 if started; -1 if not, for instance because it was already started; also 0 without
-     *     {@code init}, but then nothing happens and no event follows
+     * @return 0 if started; -1 if not, for instance because it was already started. Without
+     *     {@code init}, returns 0, but nothing happens and no event follows.
      */
     public native int analyze(int highlightSeconds, int maxBeats, int reserved);
 
