@@ -1,5 +1,5 @@
-// The result of every function of the command that can fail. A failure converts to false after
-// success.
+// The result of each function of the command that can fail. It converts to true if the function
+// failed.
 //
 //     if (failure failed = write_file(target, content, force)) return failed;
 #ifndef TAVO_CLI_FAILURE_H

@@ -59,8 +59,8 @@ int wrong_usage(const std::string &sentence) {
     return kExitUsage;
 }
 
-// The parser splits a FILE in square brackets at its commas. `shielded` prevents this with a byte
-// before each bracket, which is removed again when the value is checked.
+// The parser splits a FILE in square brackets at its commas. To prevent this, `shielded` puts this
+// byte before the opening bracket. The check of the value removes the byte.
 constexpr char kShield = '\x01';
 
 // Returns the arguments in the order that the parser requires, last to first.
@@ -210,7 +210,7 @@ void declare_all(CLI::App &app, options &out) {
         const bool is_file = option->get_positional();
         const auto check = [is_file](std::string &value) {
             if (value.size() > 1 && value[0] == kShield && value[1] == '[') value.erase(0, 1);
-            // A file without a name is reported with the other files that cannot be read.
+            // An empty FILE is not refused here. It is reported like a file that cannot be read.
             return value.empty() && !is_file ? "the value is empty" : "";
         };
         option->transform(CLI::Validator(check, ""));
@@ -222,7 +222,7 @@ bool is_folder(const std::string &path) {
     return std::filesystem::is_directory(path, ignored);
 }
 
-// True if the options contradict each other, and the error sentence.
+// Whether the options contradict each other, and the error sentence if they do.
 using contradiction = std::pair<bool, std::string>;
 
 failure first_of(std::initializer_list<contradiction> table) {

@@ -80,7 +80,7 @@ int remove_file_at_signal(temporary_file &file) {
 
 void note_temporary_file(const std::string &path) {
     if (own_file == nullptr || path.size() >= PATH_MAX) return;
-    // The first character is written last, because the path counts as empty until then.
+    // The first character is written last, so that the path counts as empty until it is complete.
     own_file->path[0] = '\0';
     if (!path.empty()) memcpy(own_file->path + 1, path.c_str() + 1, path.size());
     own_file->path[0] = path.c_str()[0];

@@ -32,8 +32,8 @@ int wait_for_end(pid_t &pid);
 // Converts a waitpid status to words: "by signal 9 (Killed)" or "with status 1".
 std::string ending_text(int status);
 
-// The name of the temporary file that a worker process is writing, in memory shared with the
-// command. If either process dies, the other one removes the file.
+// The path of the temporary file that a worker process is writing. The worker shares this memory
+// with the command: if either process dies, the other one removes the file.
 struct temporary_file {
     char path[PATH_MAX];  // empty if there is no file
 };
@@ -41,12 +41,12 @@ struct temporary_file {
 // Returns null if memory runs out.
 std::shared_ptr<temporary_file> share_temporary_file();
 
-// Called in a worker. From then on, note_temporary_file stores its path in `file`, and a signal
-// removes the file and ends the worker. Returns the number of the signal.
+// Called in a worker. From then on, note_temporary_file stores the path in `file`, and a signal
+// removes that temporary file and ends the worker. Returns the number of the signal.
 int remove_file_at_signal(temporary_file &file);
 
-// Stores the path of this worker's temporary file, or an empty path when it is gone. A worker has
-// at most one such file at a time. Does nothing in the command itself.
+// Stores the path of this worker's temporary file, or an empty path once the file is gone. A worker
+// has at most one such file at a time. Does nothing in the command itself.
 void note_temporary_file(const std::string &path);
 
 // Removes the file, if there is one. Safe in a signal handler.

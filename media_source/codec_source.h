@@ -28,7 +28,7 @@ struct container_ops {
 struct codec_ops {
     int32_t code;         // codec code of the codec library
     int32_t frame_bytes;  // largest compressed frame
-    int32_t spare_bytes;  // how far a frame's PCM may exceed q_room before its reduction, bytes
+    int32_t spare_bytes;  // bytes by which a frame's PCM may exceed q_room before it is reduced
     int32_t min_rate;     // Hz; streams with a lower rate, or one above max_rate, are refused
     int32_t max_rate;     // Hz
     int32_t (*decode)(void *decoder, const wexa_frame *frame, wexa_output *output,
@@ -53,9 +53,9 @@ int32_t codec_source_first_audio(const int32_t *kinds, int32_t count);
 int32_t codec_source_reduce_to_first(const mtsrc_ctx *src, int32_t bytes, int64_t first);
 int32_t codec_source_reduce_none(const mtsrc_ctx *src, int32_t bytes, int64_t first);
 
-// Starts opening a source: calls `init`, a function of the codec library that returns 0 on success,
-// then sets demux, dstream and decoder to null. Returns 0, TAVO_ERR_HANDLE for a null handle,
-// TAVO_ERR_OPEN without a probe file, or TAVO_ERR_CODEC if `init` fails.
+// Starts opening a source: calls `init`, then sets demux, dstream and decoder to null. `init` is a
+// function of the codec library that returns 0 on success. Returns 0, TAVO_ERR_HANDLE for a null
+// handle, TAVO_ERR_OPEN without a probe file, or TAVO_ERR_CODEC if `init` fails.
 int32_t codec_source_begin_open(mtsrc_ctx *src, int32_t (*init)());
 
 // Stores the decoder and the stream's format in the handle, which then owns the decoder. Returns 0,
@@ -68,8 +68,8 @@ int32_t codec_source_set_decoder(mtsrc_ctx *src, const codec_ops &codec, void *d
 int32_t codec_source_end_open(const codec_source &source, mtsrc_ctx *src, wexa_tags *tags,
                               int32_t code);
 
-// The other four operations of a source. They accept a null handle; close also accepts a handle
-// whose open failed.
+// The operations of a source other than open. They accept a null handle; close also accepts a
+// handle whose open failed.
 void codec_source_close(const codec_source &source, mtsrc_ctx *src);
 int32_t codec_source_get_frm(const codec_source &source, mtsrc_ctx *src, int32_t want,
                              mtsrc_frame *frame);

@@ -20,7 +20,7 @@ struct mtsrc_format {
 };
 static_assert(offsetof(mtsrc_format, duration) == 16);
 
-// Results other than 0 and the negative codes of tavo.h.
+// Further results, besides 0 and the codes of tavo.h.
 constexpr int32_t kMtsrcEndOfStream = 1;  ///< mtsrc_getstream delivered all that was left
 constexpr int32_t kMtsrcDone = -5;        ///< mtsrc_reset or mtsrc_deinit succeeded
 

@@ -15,7 +15,7 @@ constexpr int32_t kQueueBytes = 1'048'576;  // value of q_cap
 // before each frame the queue guarantees only the 131,070 bytes that the block needs in mono.
 constexpr int32_t kQueueSpareBytes = 131'070;
 
-// Codec codes of the codec library. A decoder receives one with each compressed frame.
+// Codec codes of the codec library. A decoder receives its codec's code with each frame.
 constexpr int32_t kCodecMpeg = 305;
 constexpr int32_t kCodecAac = 306;
 constexpr int32_t kCodecFlac = 322;

@@ -11,8 +11,8 @@
 // The function that adds a format's next frame to the queue, and its argument.
 struct pcm_fill {
     // `frame_buf` has frm_buf_size bytes, and the queue has more than that free at q_wr. Returns 0
-    // to be called again, even if it added nothing; kMtsrcEndOfStream; or a negative code, which
-    // ends the read.
+    // to continue the read, even if no bytes were added. kMtsrcEndOfStream or a negative code ends
+    // the read.
     int32_t (*step)(mtsrc_ctx *src, uint8_t *frame_buf, void *work);
     void *work;  // argument of step
 };
@@ -23,12 +23,12 @@ void pcm_queue_clear(mtsrc_ctx *src);
 void pcm_queue_push(mtsrc_ctx *src, int32_t bytes);
 
 // Implements every get_frm: fills the queue until it holds `want` bytes, then delivers them.
-// Returns 0; kMtsrcEndOfStream after delivering what is left; TAVO_ERR_MEMORY if memory runs out;
-// TAVO_ERR_HANDLE for a bad frame record, or if `want` is negative or more than the queue can hold,
-// which then keeps its bytes; TAVO_ERR_READ if no step adds anything; or a step's own code.
+// Returns 0, kMtsrcEndOfStream after delivering what is left, TAVO_ERR_MEMORY if memory runs out,
+// TAVO_ERR_READ if no step adds anything, or a step's own code. Returns TAVO_ERR_HANDLE and keeps
+// all bytes queued if the frame record is bad, or `want` is negative or too large.
 int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pcm_fill &fill);
 
-// Releases the memory of the pages that hold no PCM. They stay allocated and read as zeros.
+// Releases the memory of pages that hold no PCM. The pages stay allocated and read as zeros.
 void pcm_queue_release_pages(const mtsrc_ctx *src);
 
 // Reduce interleaved PCM to one channel: the first, or the mean of the first two. `dst` may equal

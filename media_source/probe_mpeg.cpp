@@ -1,5 +1,5 @@
-// Recognises MPEG audio: two frame headers within the first 32 KiB that are exactly one frame
-// length apart.
+// Recognises MPEG audio by two frame headers within the first 32 KiB. The distance between them
+// must be exactly one frame length.
 #include <cstdlib>
 #include <cstring>
 

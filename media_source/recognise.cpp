@@ -18,8 +18,8 @@ bool is_at(const uint8_t *head, size_t at, const char *name) {
     return memcmp(head + at, name, 4) == 0;
 }
 
-// Reads `count` bytes after an ID3v2 tag, or at the current offset if there is no tag, and restores
-// the offset.
+// Reads `count` bytes at the current offset, or after the ID3v2 tag that starts there. Restores the
+// offset.
 bool peek_after_tag(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file, uint8_t *bytes,
                     int32_t count) {
     int64_t start = 0;

@@ -29,7 +29,7 @@ constexpr size_t kMostMessageBytes = 65536;  // only the first line is used
 // Limit on the address space. A damaged file can make ffmpeg allocate hours of silence at once.
 constexpr rlim_t kMostProgramBytes = rlim_t{448} << 20;
 constexpr int kReadPollMs = 1000;  // time between two checks of the clock
-constexpr int kEndPollMs = 10;     // time between two checks whether the program has ended
+constexpr int kEndPollMs = 10;     // time between two checks for the end of the program
 
 // Containers that hold their own audio. Playlists and scripts (HLS, concat, DASH, SDP, image
 // sequences) refer to other files and are not accepted.
@@ -62,8 +62,8 @@ std::vector<std::string> command_line(const ffmpeg_task &task) {
     return words;
 }
 
-// Runs in the new process. Ctrl-C does not reach it, because it is in a process group of its own;
-// the worker decides when it stops.
+// Runs in the new process, which gets its own process group so that Ctrl-C does not reach it. The
+// worker decides when ffmpeg stops.
 [[noreturn]] void become_ffmpeg(char *const *words, int input, int output, int messages,
                                 pid_t parent) {
     setpgid(0, 0);
@@ -100,7 +100,7 @@ int start_ffmpeg(const ffmpeg_task &task, ffmpeg_process &process) {
     return code;
 }
 
-// Reads the available bytes. Closes fd at the end of the pipe.
+// Reads the available bytes. Closes fd at the end of the pipe or after an error.
 std::string_view read_part(int &fd, std::array<char, 65536> &part) {
     const ssize_t got = read(fd, part.data(), part.size());
     if (got == 0 || (got < 0 && errno != EINTR)) close_fd(fd);

@@ -1,7 +1,7 @@
 // Runs the ffmpeg program on one file, which is not trusted.
 //
-// Input: a file and the arguments for the output. Output: the bytes that the program writes to its
-// standard output. Used by song_file.h and write/clip.h in a worker process.
+// Input: a file, and the arguments that describe the output. Output: the bytes that the program
+// writes to standard output. Used by song_file.h and write/clip.h in a worker process.
 #ifndef TAVO_CLI_INPUT_FFMPEG_H
 #define TAVO_CLI_INPUT_FFMPEG_H
 

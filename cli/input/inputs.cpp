@@ -29,8 +29,8 @@ namespace {
 constexpr size_t kMostNameBytes = PATH_MAX;  // longer paths cannot be opened
 constexpr const char *kByteOrderMark = "\xEF\xBB\xBF";
 
-// Extensions of formats and containers that ffmpeg reads and the library may not. In a folder,
-// files with these extensions count as audio if ffmpeg is installed, whatever they contain.
+// Extensions of formats that ffmpeg reads but the library may be unable to read. In a folder, files
+// with these extensions count as audio if ffmpeg is available, whatever they contain.
 constexpr const char *kMediaSuffixes[] = {
     ".3gp", ".ac3", ".aif", ".aifc", ".aiff", ".amr",  ".ape", ".au",   ".avi",
     ".caf", ".dsf", ".dts", ".eac3", ".flv",  ".m2ts", ".m4a", ".m4b",  ".m4v",
@@ -46,7 +46,7 @@ file_id id_of(const struct stat &info) {
 }
 
 // Claims the marker file or clip of an input, so that no other input writes the same file. Returns
-// false if the input is to be skipped.
+// false if the input must be skipped.
 bool claim_target(input_supply &supply, input &entry, const std::string &target) {
     struct stat file {};
     struct stat folder {};
@@ -93,7 +93,7 @@ failure enter_folder(input_supply &supply, const std::string &path, const struct
     return {};
 }
 
-// True if the folder becomes an input because it contains no audio.
+// Ends the search of a folder. Returns true if it becomes an input because it has no audio.
 bool leave_folder(input_supply &supply, input &out) {
     const std::string path = std::exchange(supply.folder, "");
     if (supply.found == 0) {
@@ -109,7 +109,7 @@ bool leave_folder(input_supply &supply, input &out) {
     return false;
 }
 
-// True if the file must be analysed or reported. `refusal` is set if it cannot be read.
+// True if the file must be analysed or reported. Sets `refusal` if the file cannot be read.
 bool is_audio(const std::string &path, const options &opts, failure &refusal) {
     file_kind kind = file_kind::unknown;
     if (const int code = recognise(path, kind)) {
@@ -153,8 +153,8 @@ bool is_comment(const std::string &line) {
     return line[0] == '#' && lstat(line.c_str(), &info) != 0;
 }
 
-// Removes the next line from the text and returns it. Returns nothing if its separator has not
-// arrived, unless the list has ended.
+// Removes the next complete line from the text and returns it, or returns nothing if there is none.
+// The last line of a list needs no separator.
 std::optional<std::string> read_line(name_list &list, char separator) {
     const size_t end = list.text.find(separator);
     if (end == std::string::npos && (!list.ended || list.text.empty())) return std::nullopt;
@@ -164,9 +164,9 @@ std::optional<std::string> read_line(name_list &list, char separator) {
     return line;
 }
 
-// Reads the next name. If it returns no name, the list has ended, or more may follow once its
-// descriptor is readable. Never waits. A list with one name per line may be an M3U playlist, so
-// comments and carriage returns at line ends are removed.
+// Reads the next name. Never waits: `name` is empty if the list has ended or the next name has not
+// arrived yet. A list with one name per line may be an M3U playlist, so comments and carriage
+// returns at line ends are removed.
 failure read_name(name_list &list, char separator, std::optional<std::string> &name) {
     while (true) {
         if (!list.begun && !list.text.empty()) {
@@ -196,7 +196,7 @@ supply_state ready_if(bool is_input) {
     return is_input ? supply_state::ready : supply_state::searching;
 }
 
-// Each function below examines one name and stores it in `out`. Returns ready if it is an input.
+// Each function below examines one name, stores it in `out` and returns ready if it is an input.
 
 supply_state look_at_entry(input_supply &supply, input &out) {
     if (supply.entries.empty()) return ready_if(leave_folder(supply, out));

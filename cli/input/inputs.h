@@ -39,7 +39,7 @@ struct input_supply {
     name_list list = {};                    // list that is being read
     std::string folder = {};                // folder that is being searched, or empty
     std::vector<std::string> entries = {};  // entries of the folder not yet examined, last first
-    std::set<file_id> searched = {};        // the folder and those entered in it
+    std::set<file_id> searched = {};        // the folder and its searched subfolders
     size_t found = 0;                       // audio files found in the folder
     size_t skipped = 0;                     // other files found in the folder
     size_t existing = 0;                    // inputs left out by --skip-existing
@@ -51,18 +51,17 @@ struct input_supply {
 enum class supply_state {
     ready,
     searching,  // one name was examined, and it is not an input: call again
-    waiting,    // for a list, whose descriptor becomes readable when more has arrived
+    waiting,    // call again when the descriptor of the list is readable
     ended,
 };
 
 // Finds the next input. Never waits.
 //
-// Folders are searched for audio files, which are recognised by content, not by name; refused
-// formats count as audio, so that they are reported. With --recursive the folders inside, including
-// linked ones, are searched too, each once. A file or folder that cannot be read becomes an input
-// with a refusal, and so does a folder without audio. If each input has a marker file or a
-// clip, no two inputs get the same one. Memory grows with the folders that are searched and the
-// files that will be written, but not with the length of a list.
+// Searches folders for audio files, which are recognised by content, not by name. Unsupported
+// formats count as audio, so that they are reported. With --recursive, subfolders and linked
+// folders are searched too, each once. An unreadable file or folder, a folder without audio, and an
+// input whose marker file or clip would replace that of another input get a refusal. Memory grows
+// with the folders searched and the files to be written, not with the length of a list.
 supply_state next_input(input_supply &supply, input &out);
 
 #endif

@@ -10,11 +10,11 @@
 namespace {
 
 constexpr int64_t kDecoderDelay = 529;  // samples, in every Layer III decoder
-constexpr int32_t kDropRate = 44'100;   // Hz; at this rate the library drops that delay in stereo
+constexpr int32_t kDropRate = 44'100;   // Hz; rate at which the library drops the delay in stereo
 constexpr int64_t kLayer1Samples = 384;
 
-// Returns how many samples players drop according to the LAME header; 0 if there is none. `frame`
-// starts with the first compressed frame.
+// Returns the number of samples that players drop, as stated by the LAME header; 0 without that
+// header. `frame` starts with the first compressed frame.
 int64_t samples_dropped(std::string_view frame) {
     const auto byte = [&](size_t i) { return static_cast<uint8_t>(frame[i]); };
     const bool is_mpeg1 = (byte(1) >> 3 & 3) == 3;
@@ -97,8 +97,8 @@ double time_scale(std::string_view header) {
     return std::max(static_cast<double>(big_endian(header, is_long ? 20 : 12, 4)), 1.0);
 }
 
-// Reads the first edits of a track. Empty edits delay the track; the first other edit drops
-// everything before its media time. Returns false if there is no edit.
+// Computes a track's offset from its edit list. Empty edits delay the track; the first non-empty
+// edit drops everything before its media time. Returns false if all edits are empty.
 bool read_edits(std::string_view list, double movie_scale, double media_scale, double &ms) {
     const bool is_long = big_endian(list, 0, 1) == 1;
     const size_t field = is_long ? 8 : 4;

@@ -49,7 +49,7 @@ file_kind recognise_frame(std::string_view head) {
     return is_valid ? file_kind::mpeg : file_kind::unknown;
 }
 
-// The library does not report the system's errors, so this reads the file again.
+// Limits of find_read_error, which reads a file again because the library reports no errno.
 constexpr int64_t kHeadBytes = 1 << 20;         // enough to recognise a format
 constexpr int64_t kDescribedBytes = 128 << 20;  // enough to find the description of most streams
 
@@ -88,7 +88,7 @@ std::string explain_format(file_kind kind) {
     }
 }
 
-// Returns the reason for a tavo_probe code.
+// Returns a sentence that explains a result of tavo_probe.
 std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream) {
     const std::string subject = std::string("The ") + kind_name(kind) + " file ";
     switch (code) {

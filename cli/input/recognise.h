@@ -1,5 +1,5 @@
 // Recognises audio by the first bytes of a file, whatever its name, and explains why the library
-// cannot use a file. The library alone decides whether it can.
+// refused a file. Only the library decides whether a file can be used.
 //
 // Input: a path or bytes. Output: a file_kind, or a sentence. Used by inputs.h, song_file.h,
 // run/analyse.h and report/report.h; player_offset.h uses the functions that read bytes.
@@ -12,7 +12,7 @@
 
 #include "include/tavo.h"
 
-// mpeg: MPEG audio, Layers I to III, which messages call MP3.
+// mpeg is MPEG audio, Layers I to III; messages call it MP3.
 enum class file_kind { unknown, wav, aiff, flac, ogg, mp4, aac, mpeg, asf, matroska };
 
 constexpr size_t kKindBytes = 16;  // needed by recognise_bytes
@@ -20,8 +20,8 @@ constexpr size_t kKindBytes = 16;  // needed by recognise_bytes
 // Recognises the first bytes of a file, or those that follow its ID3v2 tags.
 file_kind recognise_bytes(std::string_view head);
 
-// Returns 0, or errno if the file cannot be opened or read. Any file that is not a regular file is
-// unknown. Never blocks.
+// Returns 0, or errno if the file cannot be opened or read. Anything except a regular file has an
+// unknown kind. Never blocks.
 int recognise(const std::string &path, file_kind &kind);
 
 // Returns the format's name for messages.
@@ -39,7 +39,7 @@ uint64_t big_endian(std::string_view bytes, size_t offset, size_t size);
 // has no such tag.
 int64_t find_id3v2_end(const std::string &path, int &code);
 
-// Returns the reason why the library refused a file: `code` is TAVO_ERR_MEMORY or the result of
+// Returns the reason why the library refused a file. `code` is TAVO_ERR_MEMORY or the result of
 // tavo_probe, which stored `stream`. Reads the file to find errors that the library does not name.
 std::string explain_refusal(const std::string &path, int32_t code, const TAVO_STREAM &stream);
 

@@ -14,7 +14,7 @@ struct shard {
     int64_t count = 1;
 };
 
-// Returns the whole number that the text consists of; nothing for any other text.
+// Parses a whole number. Returns nothing if the text contains anything else.
 std::optional<int64_t> read_number(std::string_view text);
 
 // Parses "I/N", with I from 1 to N, or "auto", which reads the environment of a Slurm array
@@ -22,8 +22,8 @@ std::optional<int64_t> read_number(std::string_view text);
 // (AWS_BATCH_JOB_ARRAY_*). If the scheduler does not state N, TAVO_SHARDS must.
 failure read_shard(const std::string &words, shard &out);
 
-// True if the file belongs to the part. A hash of the path's bytes decides, which is the same on
-// every machine.
+// True if the file belongs to the part. A hash of the path's bytes decides, so every machine gets
+// the same answer.
 bool in_shard(const shard &of, const std::string &path);
 
 #endif

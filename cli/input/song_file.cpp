@@ -22,12 +22,12 @@ namespace {
 
 constexpr off_t kMostPipeBytes = off_t{4} << 30;  // memory for data from a pipe
 
-constexpr off_t kRateOffset = 24;                             // of a WAV header
+constexpr off_t kRateOffset = 24;                             // of the rate in a WAV header
 constexpr int64_t kHeaderBytes = 44;                          // of ffmpeg's header without tags
 constexpr int64_t kMostWavBytes = (int64_t{1} << 32) - 4096;  // a WAV file has 32-bit sizes
 
-// Limit on a file's decoded sound: one minute plus this many samples per byte. Silence has about a
-// thousand in the most compact codecs. Without the limit a wrong time stamp could add hours.
+// Limit on decoded sound: one minute plus this many samples per byte of the file. In the most
+// compact codecs, silence has about 1000. Without a limit, a wrong time stamp could add hours.
 constexpr int64_t kMostSamplesPerByte = 2048;
 constexpr int64_t kSpareSeconds = 60;
 
@@ -43,14 +43,14 @@ int named_descriptor(const std::string &path) {
     return -1;
 }
 
-// True for a pipe or socket that the command inherited. Its own are close-on-exec.
+// True for a pipe or socket that the command inherited. The command's own are close-on-exec.
 bool is_inherited_pipe(int fd) {
     struct stat info {};
     return fd >= 0 && fstat(fd, &info) == 0 && (S_ISFIFO(info.st_mode) || S_ISSOCK(info.st_mode)) &&
            (fcntl(fd, F_GETFD) & FD_CLOEXEC) == 0;
 }
 
-// Copies a pipe to its end. Returns 0 or errno; ECANCELED after a stop.
+// Copies a pipe until it ends. Returns 0 or errno: ECANCELED after a stop, EFBIG for too much data.
 int copy_pipe(int source, int target, int stop_fd) {
     std::array<char, 65536> part;
     for (off_t bytes = 0; bytes <= kMostPipeBytes;) {
@@ -143,9 +143,9 @@ failure store_sound(decoding &sound, std::string_view part) {
     return {};
 }
 
-// Decodes the first audio stream of source_fd, or of `path` if source_fd is negative, to a WAV file
-// in memory: 16-bit mono, at the stream's own rate or the nearest supported one, on a player's
-// timeline.
+// Decodes the first audio stream of a file to a 16-bit mono WAV file in memory. Reads source_fd or,
+// if that is negative, `path`. Keeps the sample rate, or uses the nearest supported one. Times are
+// those of a player.
 failure decode(const std::string &path, const options &opts, int stop_fd, int source_fd,
                const std::string &filter, song_file &song) {
     decoding sound;
@@ -208,7 +208,7 @@ failure raise_song(const std::string &path, const options &opts, int stop_fd, co
                    double gain, double offset_ms, song_file &raised) {
     file_kind kind = file_kind::unknown;
     if (!song.by_ffmpeg) recognise(song.path, kind);
-    const bool is_mean =  // of all channels; the library reads the first one of other files
+    const bool is_mean =  // the library averages the channels; of other files it takes the first
         song.by_ffmpeg || kind == file_kind::mpeg || kind == file_kind::ogg;
     std::string filter = is_mean ? "" : ",pan=mono|c0=c0";
     filter += ",volume=" + std::to_string(gain) + ":precision=double";

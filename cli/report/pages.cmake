@@ -1,5 +1,5 @@
-# Generates report_pages.cpp: the two pages of --report, with their style and scripts, as arrays of strings. They are
-# divided where the command inserts text.
+# Generates report_pages.cpp: the two pages of --report, with their style and scripts, as arrays of strings. Each page
+# is split where the command inserts text.
 set(here ${CMAKE_CURRENT_LIST_DIR})
 set(parts page.css song.html shared.js song.js index.html index.js)
 list(TRANSFORM parts PREPEND ${here}/)

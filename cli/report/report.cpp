@@ -14,8 +14,8 @@
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
-// Parts of the pages, generated from this folder by pages.cmake. The title and the data of a song,
-// or the rows of the index, are inserted between them.
+// Parts of the pages, generated from this folder by pages.cmake. A page is these parts with text
+// inserted between them: the title and the data of a song, or the rows of the index.
 extern const char *const kSongPage[3];
 extern const char *const kIndexPage[2];
 
@@ -59,7 +59,7 @@ failure add_sound(const std::string &song_path, const std::string &page_path, bo
     return {};
 }
 
-// Returns a cell of the index, which is empty if the song lacks the value.
+// Returns a cell of the index. The cell is empty if the song lacks the value.
 std::string number_cell(bool has_value, const std::string &text, double value) {
     if (!has_value) return "<td></td>\n";
     return "<td class=\"number\" data-value=\"" + std::to_string(std::llround(value)) + "\">" +
@@ -83,7 +83,7 @@ std::string miniature(const std::vector<float> &loudness) {
            "role=\"img\" aria-label=\"Loudness\"><path class=\"loud\" d=\"" + path + "\"/></svg>";
 }
 
-// Returns the row of a song. The path of its page is relative to the index.
+// Returns the row of a song. `page` is the path of the song's page, relative to the index.
 std::string index_row(const record &result, const result_json &view, const std::string &page) {
     const auto duration = static_cast<double>(result.duration_ms);
     const auto beats = static_cast<double>(result.beats_ms.size());

@@ -20,16 +20,16 @@ std::string report_page_path(const options &opts, uint64_t index, const std::str
 // Checks that a page can be written. A page never replaces a song or a device.
 failure check_report(const std::string &target, bool force);
 
-// Reads the sound of the song, writes its page and returns its row of the index in `row`. Fails
-// after a stop, which makes stop_fd readable.
+// Reads the sound of the song, writes its page and stores its row of the index in `row`. Fails if
+// stop_fd becomes readable, which requests a stop.
 failure write_report_page(const record &result, const options &opts, const std::string &target,
                           int stop_fd, std::string &row);
 
 // Returns the row of a song that failed.
 std::string failed_report_row(const record &result);
 
-// Write the index. They do nothing if the options request none. After a stop the index has the rows
-// that were added before it.
+// Write the index. They do nothing unless the options request an index. After a stop, the index has
+// the rows that were added before the stop.
 failure begin_report_index(output_file &index, const options &opts);
 failure add_report_row(output_file &index, const std::string &row);
 failure finish_report_index(output_file &index, const options &opts);

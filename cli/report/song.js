@@ -190,7 +190,7 @@ const player = song.embedded ? embedded : linked;
 if (!song.embedded) audio.src = song.audio;
 
 let scheduled = [];  // click nodes that may still sound
-let clickedTo = 0;   // clicks of the beats before this time are scheduled
+let clickedTo = 0;   // all clicks before this time are scheduled
 
 function dropClicks() {
   for (const node of scheduled) node.stop();

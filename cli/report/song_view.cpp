@@ -43,8 +43,8 @@ extent merged(const extent &a, const extent &b) {
     return {std::min(a.low, b.low), std::max(a.high, b.high)};
 }
 
-// Merges pairs of bins. The number of bins is not known in advance, because the duration stated by
-// a file may be wrong.
+// Merges pairs of bins once there are too many. The length of a bin cannot be chosen in advance,
+// because a file may state a wrong duration.
 void halve_bins(sound &song) {
     for (size_t i = 0; i < kMostBins / 2; ++i) {
         song.bins[i] = merged(song.bins[2 * i], song.bins[2 * i + 1]);
@@ -90,8 +90,8 @@ failure read_samples(const std::string &path, int stop_fd, sound &song) {
     return {};
 }
 
-// Returns the lowest and the highest sample of each column of a time axis, from -127 to 127 at the
-// peak. A column covers every bin that it overlaps. The last column is that of the last sample.
+// Returns the lowest and the highest sample of each column of a time axis, scaled to a peak of 127.
+// A column covers every bin that it overlaps. The last column contains the last sample.
 result_json wave_of(const sound &song, double axis_samples) {
     int peak = 1;
     for (const extent &bin : song.bins) peak = std::max({peak, -bin.low, +bin.high});
@@ -126,14 +126,14 @@ std::vector<float> loudness_of(const sound &song) {
     return values;
 }
 
-// Returns the start and the end, in ms, of the part of the song in which a highlight can be found,
-// given the number of loudness values.
+// Returns the start and the end, in ms, of the part of the song that is searched for a highlight.
+// `count` is the number of loudness values.
 result_json searched_span(const record &result, size_t count) {
     const bool is_short = result.duration_ms / 1000 < TAVO_SHORT_SONG_S;
     const int skip = is_short ? 0 : TAVO_SEARCH_SKIP;
     const int tail = is_short ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
     const double start = skip * kHopMs;
-    // The rise may be at the end of the last window searched, so the span includes all of it.
+    // The highlight may start late in the last window searched, so the span includes that window.
     const double last = static_cast<double>(count) - tail;
     const double end = last < 0.0 ? start : last * kHopMs + kWindowMs;
     return {player_ms(result, start), player_ms(result, std::max(start, end))};

@@ -9,13 +9,13 @@
 #include "cli/run/record.h"
 #include "cli/write/json.h"
 
-// Reads the sound once, up to its end or a read error. Fails after a stop, which makes stop_fd
-// readable.
+// Reads the sound once, up to its end or a read error. Fails if stop_fd becomes readable, which
+// requests a stop.
 //
-// The view receives values of the result and: "wave", the lowest and the highest sample of each of
-// at most 4000 columns, from -127 to 127 at the song's peak; "loudness", one value every 2 s for
-// the following 6 s; and "mean", the mean of these values. All times are those of a player, so the
-// first decoded sample is at "sound_ms", which may be negative. The caller adds the sound as
+// The view receives values of the result and the following. "wave" has the lowest and the highest
+// sample of each of up to 4000 columns, scaled to a peak of 127. "loudness" has a value every 2 s
+// for the 6 s that start there, and "mean" is their mean. Times are those of a player, so
+// "sound_ms", the time of the first decoded sample, may be negative. The caller adds the sound as
 // "audio" (a URL) or "embedded" (base64).
 failure read_song_view(const record &result, int stop_fd, result_json &view);
 

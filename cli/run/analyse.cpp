@@ -21,11 +21,11 @@ namespace {
 
 constexpr int64_t kMsPerMinute = 60'000;
 
-// Mean square that --normalize gives the loudest 6 s, full scale 1: -8 dBFS. At this level the
-// library refines the highlight after any rise of 3 dB.
+// Mean square, full scale 1, to which --normalize raises the loudest 6 s: -8 dBFS. At this level,
+// any rise of 3 dB is large enough for the library to refine the highlight.
 constexpr double kRaisedPower = 0.1585;
 
-// The end of a job, set on the job's thread.
+// Reports the end of a job to the waiting thread. Set on the job's thread.
 struct job_end {
     std::atomic<const TAVO_INFO *> result{nullptr};
     int fd = -1;  // eventfd that wakes the waiting thread
@@ -54,7 +54,7 @@ double loudest_passage(const TAVO_CTX *ctx) {
     return std::pow(10.0, *std::max_element(curve, curve + count) / 10.0) - 1.0;
 }
 
-// Must be called after the callback, when the job no longer changes the instance.
+// Copies the result. Called after the callback, when the job no longer changes the instance.
 void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, const song_file &song, record &out) {
     if (tavo_has_audio(ctx) == 0 || tavo_is_complete(ctx) == 0) {
         out.error = explain_lost_audio(song.path, tavo_has_audio(ctx) != 0);
@@ -97,8 +97,8 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, const song_file &s
 
 void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out);
 
-// Replaces a coarse highlight with that of the amplified song. A result of mode both does not show
-// whether its highlight is coarse, so the song is searched again.
+// Replaces a coarse highlight with that of the amplified song. In mode both, the result does not
+// show whether the highlight is coarse, so the song itself is first searched again.
 void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record &out) {
     options search = opts;
     search.mode = TAVO_MODE_HIGHLIGHT;
@@ -126,7 +126,7 @@ void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record
     beats.erase(beats.begin(), std::lower_bound(beats.begin(), beats.end(), out.hl_pos_ms));
 }
 
-// Explains why the library refused the song, or decodes it with ffmpeg and analyses the output.
+// Decodes a refused song with ffmpeg and analyses the output, or explains the refusal.
 void analyse_refused(const options &opts, int stop_fd, int32_t code, song_file &song, record &out) {
     TAVO_STREAM stream{};
     if (code != TAVO_ERR_MEMORY) code = tavo_probe(song.path.c_str(), &stream);

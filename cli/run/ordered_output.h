@@ -18,10 +18,10 @@
 
 struct ordered_output {
     std::map<size_t, reply> waiting;  // replies that wait for those of earlier inputs
-    size_t next = 0;                  // index of the next input to write
+    size_t next = 0;                  // index of the input whose reply is next
     size_t total = 0;                 // number of inputs, or 0 if not all are known yet
     size_t done = 0;                  // replies of analyses that were not stopped
-    bool has_failure = false;         // a file or something else failed
+    bool has_failure = false;         // a file failed, or a failure was reported
     int write_error = 0;              // errno of standard output; EPIPE if its reader closed it
     output_file index;                // of the pages
     bool to_pipe = false;   // standard output is a pipe, whose reader may end before the command
@@ -35,13 +35,13 @@ constexpr int kRedrawMs = 500;  // time between two redraws of the progress line
 // Fails if the report's index cannot be created.
 failure start_output(ordered_output &output, const options &opts);
 
-// Writes the reply of the input `index`, or keeps it until those of earlier inputs have arrived.
+// Writes the reply of input `index` once the replies of all earlier inputs have arrived.
 void accept_reply(ordered_output &output, size_t index, reply &&answer);
 
 // Writes to standard error, after clearing the progress line.
 void write_message(ordered_output &output, const std::string &text);
 
-// Writes a failure that does not belong to a file. Returns true if there was one.
+// Writes a failure that concerns no single file. Returns false if `failed` is not a failure.
 bool report_failure(ordered_output &output, const failure &failed);
 
 // Redraws the progress line if the work has taken at least a second, except for a single file.

@@ -22,8 +22,8 @@ using std::chrono::steady_clock;
 
 constexpr milliseconds kStopPatience{1000};
 
-// Runs in the new process. It closes the sockets of the other workers, because with a copy left
-// open they would not notice that the command has ended.
+// Runs in the new process. Closes its copies of the other workers' sockets, because otherwise those
+// workers would not notice the end of the command.
 [[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_file &file, int fd) {
     for (worker_process &other : pool.processes) close_fd(other.fd);
     ignore_stop_signals();
@@ -55,8 +55,8 @@ failure start_process(process_pool &pool) {
     return {};
 }
 
-// Returns an idle worker or a new one. Returns null if all workers are busy, or if none could be
-// started, which sets `failed`.
+// Returns an idle worker or a new one; null if neither is available. Sets `failed` if there are no
+// workers at all and none can be started.
 worker_process *find_idle(process_pool &pool, failure &failed) {
     for (worker_process &worker : pool.processes) {
         if (!worker.current) return &worker;

@@ -14,7 +14,7 @@ enum class outcome {
 };
 
 struct record {
-    std::string file = {};  // name from the user or the folder, any bytes
+    std::string file = {};  // name from the options, a list or a folder; any bytes
     int32_t mode = 0;       // TAVO_MODE_*
     outcome status = outcome::failed;
     std::string error = {};  // reason of a failure, or empty
@@ -45,7 +45,7 @@ struct record {
 // Converts a time of the record to the time of a player, at least 0.
 double player_ms(const record &result, double ms);
 
-// Returns the end of a highlight that lasts length_s seconds, but at most the end of the song.
+// Returns the end of a highlight of length_s seconds, or the end of the song if that is earlier.
 double highlight_end_ms(const record &result, int32_t length_s);
 
 // True if the result shows whether the start of the highlight is exact to 0.4 s. In mode both, it

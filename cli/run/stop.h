@@ -3,8 +3,8 @@
 #ifndef TAVO_CLI_RUN_STOP_H
 #define TAVO_CLI_RUN_STOP_H
 
-// Installs the handlers, and ignores the signals of failed writes, so that the writes return
-// errors. Returns false with errno if the system refuses.
+// Installs the handlers. Ignores SIGPIPE and SIGXFSZ, so that a failed write returns an error
+// instead. Returns false with errno if the system refuses.
 bool watch_for_stop();
 
 // Ignores these signals in a worker process, which ends when its socket is closed.

@@ -92,7 +92,7 @@ failure check_side_files(const request &message, const options &opts) {
     return failed;
 }
 
-// `row` receives the song's row of the index of pages, if there is one.
+// `row` receives the song's row of the report's index if a report is requested.
 failure write_side_files(record &result, const options &opts, uint64_t index, int stop_fd,
                          const song_file &song, std::string &row) {
     failure failed;
@@ -107,7 +107,7 @@ failure write_side_files(record &result, const options &opts, uint64_t index, in
     return failed;
 }
 
-// Returns the reply for a failure that is not the song's fault and that the store does not record.
+// Returns the reply for a failure that is not the song's fault, so the store does not record it.
 reply make_failed_reply(const request &message, const options &opts, int stop_fd,
                         const std::string &error) {
     record result = {message.path, opts.mode, outcome::failed, error};
@@ -149,7 +149,7 @@ std::string serve(const request &message, const options &opts, int stop_fd) {
 }
 
 // Each job reuses the heap of the previous one instead of asking the system for new pages. The heap
-// starts large enough for a song, in huge pages: one page fault instead of 512.
+// starts large enough for a song, in huge pages. Each of them takes one page fault instead of 512.
 void prepare_heap() {
     mallopt(M_TRIM_THRESHOLD, kFreeMemoryKept);
     mallopt(M_MMAP_THRESHOLD, kLargestThreshold);  // so that the block below is part of the heap

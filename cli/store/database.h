@@ -17,9 +17,9 @@ using cell = std::optional<std::string>;
 using row = std::vector<cell>;
 using row_reader = std::function<void(const row &)>;  // may be null
 
-// An open connection: runs a statement with the values $1, $2 ... and passes on each row that it
-// returns. $1 is always a path. Failures carry the database's message. They are permanent if the
-// file is damaged, or if a table or a permission is missing.
+// An open connection. Runs a statement with `values` as $1, $2 and so on, and calls on_row for each
+// row of the result. $1 is always a path. A failure has the database's message; if the file is
+// damaged, or a table or a permission is missing, it is permanent.
 using connection =
     std::function<failure(const std::string &sql, const row &values, const row_reader &on_row)>;
 
@@ -40,8 +40,8 @@ struct database_kind {
 // Finds the kind of database for the URL of a store, and the location for its open function.
 failure find_database(const std::string &url, const database_kind **kind, std::string &location);
 
-// Returns the text with *** in place of every word of the URL's user name and password, that is, of
-// the part between :// and the last @.
+// Returns the text with *** in place of each word that also occurs in the URL's user name or
+// password, that is, between :// and the last @.
 std::string without_credentials(const std::string &text, const std::string &url);
 
 // Returns null if the program was built without SQLite.

@@ -91,8 +91,8 @@ failure open_server(const std::string &location, bool /*read_only*/, connection 
 
 }  // namespace
 
-// The command finds this record by its name. The path is limited because an index entry may take a
-// third of a page of 8 KiB.
+// The command finds this record by its name. The length of a path is limited because an index entry
+// may take at most a third of an 8-KiB page.
 extern "C" const database_kind tavo_postgresql_database = {
     "BYTEA", "TIMESTAMPTZ", "JSON", "date_trunc('second', now())", 2600,
     // Reading pg_class makes the server notice a table that another command has just created.

@@ -40,8 +40,8 @@ int connect(const std::string &name, int flags, database &db) {
     return SQLITE_OK;
 }
 
-// In a read-only folder SQLite opens a database with a write-ahead log only as immutable, which
-// ignores the log. That is safe if the log is empty.
+// A database with a write-ahead log in a read-only folder can be opened only as immutable. SQLite
+// then ignores the log, which is safe if the log is empty.
 bool has_empty_log(const std::string &location) {
     std::error_code failed;
     const uintmax_t size = std::filesystem::file_size(location + "-wal", failed);

@@ -63,8 +63,8 @@ constexpr const char *kStatusQuery =
     "SELECT status FROM songs WHERE path = $1 AND mode = $2 AND length_s = $3 AND max_beats = $4 "
     "AND size = $5 AND mtime_ns = $6";
 
-// Returns the statements that create the table or add missing columns to an older one, and set the
-// version.
+// Returns the statements that create the table if it is missing, add the columns of version 2 and
+// set the version.
 std::vector<std::string> upgrade_statements(const database_kind &kind) {
     const std::string table =
         "CREATE TABLE IF NOT EXISTS songs (path " + std::string(kind.path_type) +
@@ -79,8 +79,8 @@ std::vector<std::string> upgrade_statements(const database_kind &kind) {
             formatted(kind.set_version, kTableVersion)};
 }
 
-// Returns the statement that inserts a row or replaces the one with its key. Its values are those
-// of the key, the size, the modification time and the cells of append_result_cells.
+// Returns the statement that inserts a row or replaces the row with the same key. The values are
+// the key, the size, the modification time and the cells of append_result_cells.
 std::string put_statement(const database_kind &kind) {
     std::vector<std::string> others = {"size", "mtime_ns"};
     for (const result_column &column : kResultColumns) others.emplace_back(column.name);
@@ -97,8 +97,8 @@ std::string put_statement(const database_kind &kind) {
            ") ON CONFLICT (" + kKey + ") DO UPDATE SET " + changes;
 }
 
-// Returns the query for the songs after a path, in the order of their paths. Its values are the key
-// with that path, $1 to $4, and the status, $5.
+// Returns the query for the next songs after a path, in the order of their paths. The values are
+// the key with that path ($1 to $4) and the status ($5).
 std::string page_query(int version) {
     const size_t count = std::size(kResultColumns) - (version < kTableVersion ? kAddedColumns : 0);
     std::string columns = "path";
@@ -133,7 +133,7 @@ bool read_value(const std::string &text, column_type type, json &value) {
         value = as_utf8(text);
         return true;
     }
-    // A nested list is damaged. It is not parsed, because it may be very deep.
+    // A nested list means a damaged row. It is not parsed, because it may be very deep.
     const size_t last_bracket = text.find_last_of("[{");
     if (last_bracket != std::string::npos && last_bracket > 0) return false;
     value = json::parse(text, nullptr, false);
@@ -143,7 +143,7 @@ bool read_value(const std::string &text, column_type type, json &value) {
            std::all_of(value.begin(), value.end(), std::mem_fn(&json::is_number));
 }
 
-// Converts a row of page_query to a song, whose result lacks the name of the file.
+// Converts a row of page_query to a song. Its result lacks the name of the file.
 stored_song song_of(const row &cells, int32_t mode) {
     stored_song song;
     song.path = cells[0].value_or("");

@@ -1,9 +1,9 @@
 // Results in a database: --store. Several commands may share one store. Without --store every
 // function does nothing.
 //
-// Input: results as JSON (write/json.h), in the command's own process. Output: one row per song and
-// parameters, in batches of one transaction each: a kill at any moment loses at most the open batch
-// and leaves no row half-written. Used by run/analyse_inputs.h.
+// Input: results as JSON (write/json.h). Output: one row for each song and set of parameters. A
+// batch of rows is one transaction, so a kill at any moment loses at most the open batch and leaves
+// no row half-written. Used by run/analyse_inputs.h, in the command's own process.
 #ifndef TAVO_CLI_STORE_STORE_H
 #define TAVO_CLI_STORE_STORE_H
 
@@ -36,10 +36,10 @@ struct store {
     std::string location;
     connection run;                  // null while disconnected
     int version = 0;                 // of the table
-    bool has_failed = false;         // the store is no longer used, and the run ends
+    bool has_failed = false;         // the store is no longer used, and the command ends
     std::vector<stored_song> batch;  // not committed yet
     std::chrono::steady_clock::time_point batch_since;
-    std::deque<stored_song> page;  // with --from-store: rows that were read, not yet returned
+    std::deque<stored_song> page;  // with --from-store: rows read but not yet returned
     std::string last_path;         // of the page
     int64_t stored = 0;            // rows committed
     int64_t known = 0;             // songs skipped because they are stored
@@ -49,12 +49,12 @@ struct store {
 // Connects and, unless the store is only read, creates or upgrades the table. Does not retry.
 failure open_store(store &db, const options &opts);
 
-// The following functions retry while the database does not answer, with growing pauses, for at
-// most --patience. Each pause is reported on standard error, and a stop ends it early. After a
-// failure the store is no longer used.
+// If the database does not answer, the following functions retry with growing pauses, for at most
+// --patience. Each pause is reported on standard error, and a stop ends it early. After a failure
+// the store is no longer used.
 
-// Sets is_new if the song must be analysed: its current file is not stored for these parameters, or
-// the options request another analysis. file receives the state of the file.
+// Sets is_new if the song must be analysed, because its current file is not stored for these
+// parameters or the options request another analysis. `file` receives the state of that file.
 failure find_song(store &db, const std::string &path, file_state &file, bool &is_new);
 
 // Adds a result to the batch and commits the batch if it is full or old. After a failure of the
@@ -65,8 +65,8 @@ failure add_song(store &db, stored_song &&song);
 failure commit_old_batch(store &db);
 int batch_timeout_ms(const store &db);  // time until the batch is old, for poll; -1 if it is empty
 
-// With --from-store: reads the next row of these parameters, in the order of the paths. found is
-// false after the last one.
+// With --from-store: reads the next row for the command's parameters, in the order of the paths.
+// found is false after the last row.
 failure read_next(store &db, stored_song &song, bool &found);
 
 // Commits the last batch. Results that could not be stored are written to standard output as JSON.

@@ -16,9 +16,9 @@ namespace fs = std::filesystem;
 
 constexpr const char *kBitRate = "192k";  // of lossy encodings
 
-// The extensions of an input and of its clip. There are no clips in ADTS, MPEG Layer II, AC-3,
-// Windows Media, Matroska or WebM: they would start late, because ffmpeg states no encoder delay
-// there.
+// The extensions of an input and of its clip. No clip is written as ADTS, MPEG Layer II, AC-3,
+// Windows Media, Matroska or WebM: in these, ffmpeg states no encoder delay, so the clip would
+// start late.
 struct audio_ending {
     const char *input;
     const char *clip;
@@ -72,7 +72,7 @@ failure write_clip(const record &result, const options &opts, const std::string 
     }
     output_file file;
     if (failure failed = begin_output(file, target, ending_of(target))) return failed;
-    // The progress on standard output shows run_ffmpeg that ffmpeg is working.
+    // The progress reports on standard output keep run_ffmpeg from ending a busy ffmpeg.
     const std::vector<std::string> words = {
         "-map",          "0:a:0",  "-af",  cut_filter(result, opts),
         "-map_chapters", "-1",     "-b:a", kBitRate,

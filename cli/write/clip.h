@@ -12,13 +12,13 @@
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-// Returns the path of an input's clip: opts.clip, or, if that is a folder, a file in it. The
-// extension of such a file depends on that of the input.
+// Returns the path of an input's clip. If opts.clip is a folder, the clip is a file in that folder,
+// with an extension that depends on the input's. Otherwise the path is opts.clip.
 std::string clip_path(const std::string &input, const options &opts);
 
 // Writes opts.length_s seconds of the song, starting at the highlight, with fades of opts.fade_s
-// seconds at both ends. Times are those of a player. A failure leaves the target unchanged, and so
-// does a stop, which makes stop_fd readable.
+// seconds at both ends. Times are those of a player. Fails if stop_fd becomes readable, which
+// requests a stop. A failure leaves the target unchanged.
 failure write_clip(const record &result, const options &opts, const std::string &target,
                    int stop_fd, const song_file &song);
 

@@ -19,8 +19,8 @@ std::string as_utf8(const std::string &bytes);
 // Replaces each character that has a replacement.
 std::string replaced(const std::string &text, const std::map<char, const char *> &replacements);
 
-// Return valid UTF-8 with & < > and " as entities. xml_text also writes U+FFFD for characters that
-// XML forbids.
+// Return valid UTF-8 with entities for the characters & < > and ". xml_text also writes U+FFFD in
+// place of characters that XML forbids.
 std::string html_text(const std::string &bytes);
 std::string xml_text(const std::string &bytes);
 
@@ -37,7 +37,7 @@ std::string stem(const std::string &name);
 std::string file_url(const std::string &path);
 
 // Returns the name followed by the suffix. If the result is too long for a file system, the name is
-// cut and followed by a number that is computed from the whole name.
+// cut, and a hash of the whole name is put before the suffix.
 std::string fitting_name(const std::string &name, const std::string &suffix);
 
 #endif

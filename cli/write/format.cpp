@@ -17,8 +17,8 @@
 
 namespace {
 
-// Mean square at -10 dBFS, relative to full scale. The library refines the highlight of a song with
-// louder passages.
+// Mean square at -10 dBFS, full scale 1. If a song has louder passages, the library refines the
+// highlight.
 constexpr double kRefinedPower = 0.1;
 
 // Keys of json_object, in the order of the columns of CSV.
@@ -63,7 +63,7 @@ std::string text_record(const record &result) {
 
 // ---- CSV.
 
-// Returns the name byte for byte, whatever its encoding. On a terminal it is shown as text.
+// Returns the exact bytes of the name, or readable text if standard output is a terminal.
 std::string name_text(const std::string &name) {
     return isatty(STDOUT_FILENO) == 1 ? shown(name) : name;
 }

@@ -17,8 +17,8 @@ std::string format_head(result_format format);
 // Returns the text of one record; empty if the format does not print it.
 std::string format_record(const options &opts, const record &result);
 
-// Fills a template of --print: appends its text with each {field} replaced, and with \n, \t and
-// other escaped characters. Fails for an unknown field.
+// Fills a template of --print: appends its text to `filled`, with each {field} and each escape such
+// as \n replaced. Fails for an unknown field.
 failure fill_template(const std::string &text, const record &result, std::string &filled);
 
 #endif

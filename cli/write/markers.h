@@ -24,20 +24,20 @@ struct marker_format {
 // Returns all formats in the order of --help.
 const std::vector<marker_format> &marker_formats();
 
-// Returns null for any other word.
+// Returns the format with this word, or null.
 const marker_format *find_marker_format(const std::string &word);
 
 // Returns the names of the rates of --fps, in order.
 std::vector<std::string> frame_rate_names();
 
 // Returns the path of the marker file of an input. A name that is too long for a file system is
-// shortened and numbered.
+// cut, and a hash is added.
 std::string marker_path(const std::string &input, const options &opts);
 
 // Returns the whole content of the file.
 std::string marker_content(const record &result, const options &opts);
 
-// Returns the end of the highlight: its start plus --length, or plus the usual length of a preview.
+// Returns the end of the highlight. Without --length, a highlight is as long as a usual preview.
 double region_end_ms(const record &result);
 
 #endif

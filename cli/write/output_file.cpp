@@ -28,13 +28,13 @@ failure exists_already(const std::string &target) {
     return {"The file " + shown(target) + " exists already; --force overwrites it."};
 }
 
-// Moves a file, whose old name may remain. Without force, an existing target is an error. Returns 0
-// or an errno value.
+// Moves a file, but may leave its old name in place. Without force, an existing target is an error.
+// Returns 0 or an errno value.
 int move_file(const std::string &from, const std::string &to, bool force) {
     if (force) return rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
     if (renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
     if (errno != EINVAL && errno != ENOSYS) return errno;
-    // The file system lacks that operation. A link also fails if the target exists.
+    // The file system lacks RENAME_NOREPLACE. A link also fails if the target exists.
     return link(from.c_str(), to.c_str()) == 0 ? 0 : errno;
 }
 

@@ -8,7 +8,7 @@
 // Formats like printf and returns at most 95 characters.
 std::string formatted(const char *format, ...) __attribute__((format(printf, 1, 2)));
 
-// Return the word of a TAVO_MODE_* (highlight, beats or both), and the mode of such a word.
+// Convert a TAVO_MODE_* to its word (highlight, beats or both), and such a word to its mode.
 const char *mode_word(int32_t mode);
 int32_t mode_of(const std::string &word);
 

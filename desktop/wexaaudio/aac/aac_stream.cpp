@@ -29,8 +29,8 @@ constexpr int32_t kMaxBlockBytes = 8191;  // limit of the ADTS length field; rea
 //
 // In low-complexity AAC, one earlier frame covers the overlap. Band replication needs more: its
 // filters and envelopes have a longer memory, and its header may occur only in every tenth frame.
-// With a preroll of 8 frames the difference is audible. Prediction, which other object types use,
-// also has a longer memory.
+// With a preroll of 8 frames, the difference from a linear read is audible. Prediction, which other
+// object types use, also has a longer memory.
 constexpr int32_t kGroup = 256;
 constexpr int32_t kPreroll = 1;
 constexpr int32_t kLongPreroll = 12;
@@ -82,7 +82,7 @@ void put_general(bit_writer *w, const aac_config &config) {
 }
 
 // Adds spectral band replication and, if `parametric`, parametric stereo to the configuration.
-// Without this, a decoder that starts at a frame without such data would never apply it. Does
+// Without this, a decoder that starts at a frame without such data would never apply them. Does
 // nothing unless the object type is low complexity.
 void state_sbr(aac_config *config, bool parametric) {
     // Twice the core's rate is three entries earlier in the table.

@@ -1,5 +1,5 @@
-// The AAC code that the ADTS reader and the MP4 demuxer share. It builds the AudioSpecificConfig,
-// which a decoder needs before the raw blocks, and describes the stream of raw blocks, which all
+// The AAC code that the ADTS reader and the MP4 demuxer share. It builds the AudioSpecificConfig
+// that a decoder needs before the raw blocks. It also describes the stream, in which all raw blocks
 // decode to the same number of samples.
 //
 // Input: the fields of an ADTS header or the configuration of an MP4 track; the offset of each raw
@@ -30,8 +30,8 @@ int32_t aac_rate_of_index(int32_t index);
 // Builds a configuration from the fields of a header. `channels` is from 0 to 15.
 void aac_config_make(aac_config *config, int32_t object_type, int32_t rate_index, int32_t channels);
 
-// Completes a configuration with 0 channels from the program configuration element that starts the
-// raw block `data`. Returns false if the element does not end within `bytes`.
+// Completes a configuration with 0 channels from the program configuration element at the start of
+// the raw block `data`. Returns false if the element does not end within `bytes`.
 bool aac_config_add_program(aac_config *config, const uint8_t *data, int32_t bytes);
 
 // Copies a configuration and parses its first fields. Returns false if it is too long or too short.

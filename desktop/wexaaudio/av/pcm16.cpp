@@ -19,7 +19,7 @@ constexpr float kScale = 32768.0f;
 constexpr float kRoundMagic = 12582912.0f;
 constexpr int32_t kRoundMagicBits = 0x4B400000;
 
-// Converts `count` samples, from 1 to kQuad, to 16-bit integers. The other lanes are 0.
+// Converts `count` samples (1 to kQuad) to 16-bit integers. The other lanes are 0.
 inline int_quad round_clip(const float *samples, ptrdiff_t count) {
     constexpr float_quad kMost = {32767.0f, 32767.0f, 32767.0f, 32767.0f};
     float_quad in = {};

@@ -150,7 +150,7 @@ bool decode_block(flac_stream *s) {
     return true;
 }
 
-// Seeks to a sample and decodes its block from there on. Returns false on failure.
+// Seeks to a sample and decodes its block from that sample on. Returns false on failure.
 bool find_sample(flac_stream *s, int64_t sample) {
     s->count = 0;
     s->damaged = false;
@@ -159,7 +159,7 @@ bool find_sample(flac_stream *s, int64_t sample) {
            FLAC__stream_decoder_seek_absolute(s->decoder, number) != 0 && s->count > 0;
 }
 
-// Returns the end, in samples, of the last block that starts at or after a file offset, or 0.
+// Returns the end, in samples, of the last block after a file offset, or 0 if there is none.
 int64_t last_end(flac_stream *s, int64_t offset) {
     s->damaged = false;
     s->at = offset;
@@ -173,8 +173,8 @@ int64_t last_end(flac_stream *s, int64_t offset) {
     return end;
 }
 
-// Finds the end of the last block, which is where the audio really ends, by searching from the end
-// of the file. Returns false if no plausible end is found.
+// Searches the end of the file for the last block. The end of that block is the true end of the
+// audio. Returns false if no plausible end is found.
 bool find_end(flac_stream *s, int64_t *end) {
     const int64_t size = s->file->size;
     for (int64_t tail = kTail; *end == 0 && !s->file->failed; tail *= 4) {

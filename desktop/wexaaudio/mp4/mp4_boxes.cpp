@@ -23,8 +23,8 @@ constexpr uint32_t name_of(const char (&text)[5]) {
     return name;
 }
 
-// File offsets of a box's contents or of a level, which is a sequence of boxes. Both are 0 for a
-// missing box.
+// File offsets of the start and the end of a box's contents, or of a level (a sequence of boxes).
+// Both are 0 for a missing box.
 struct span {
     int64_t from;
     int64_t to;

@@ -1,5 +1,5 @@
-// Reads the first audio track of an MP4 file, AAC or MPEG Layer III. A demuxer has no other stream,
-// so the stream handle is the demuxer itself.
+// Reads the first audio track of an MP4 file, AAC or MPEG Layer III. A demuxer has only this
+// stream, so the stream handle is the demuxer itself.
 //
 // Input: mtsrc_io. Output: PCM and the information records. Follows mp4/mp4_boxes.h.
 #include <algorithm>

@@ -9,9 +9,9 @@ constexpr int32_t kVersionReserved = 1;
 constexpr int32_t kVersion1 = 3;
 constexpr int32_t kVersion25 = 0;
 constexpr int32_t kModeMono = 3;
-constexpr int32_t kVbriAt = 36;  // bytes from the start of the frame, whatever its side information
+constexpr int32_t kVbriAt = 36;  // bytes after the frame's start, for any size of side information
 
-// Sample rates of MPEG-1 in Hz. Those of MPEG-2 are half as high, those of 2.5 a quarter.
+// Sample rates of MPEG-1 in Hz. Those of MPEG-2 are half as high, those of MPEG-2.5 a quarter.
 constexpr int32_t kRates[3] = {44100, 48000, 32000};
 
 // Bitrates in kbit/s, indexed by [0 for MPEG-1, 1 for others][layer - 1][bitrate index].

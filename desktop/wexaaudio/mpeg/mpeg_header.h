@@ -28,7 +28,7 @@ bool mpeg_parse(const uint8_t *p, mpeg_header *h);
 bool mpeg_same_stream(const mpeg_header *a, const mpeg_header *b);
 
 // True if a stream's first frame is an encoder's info frame (Xing, Info, VBRI) instead of audio.
-// p[bytes] is the start of the frame.
+// `p` has the first `bytes` bytes of the frame.
 bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
 
 // Sets the fields of `info` that determine how frames like `head` are decoded.

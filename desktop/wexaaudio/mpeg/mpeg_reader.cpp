@@ -51,8 +51,8 @@ int64_t find_end(io_file *file) {
     return end;
 }
 
-// True if `p` starts a chain of consecutive headers of one stream. A chain that ends exactly at the
-// end of the audio may be shorter. `p` has `got` bytes; the audio ends `to_end` bytes after `p`.
+// True if a chain of consecutive headers of one stream starts at `p`. A short chain counts if it
+// ends exactly where the audio ends. `p` has `got` bytes; the audio ends `to_end` bytes after `p`.
 bool starts_chain(const mpeg_scan *s, const uint8_t *p, int32_t got, int64_t to_end,
                   mpeg_header *first) {
     const mpeg_header *reference = s->started ? &s->head : nullptr;

@@ -1,5 +1,5 @@
 // Reads the first audio stream in an Ogg file's first group of streams; it must be Vorbis. A
-// demuxer has no other stream, so the stream handle is the demuxer itself.
+// demuxer has only this stream, so the stream handle is the demuxer itself.
 //
 // Input: mtsrc_io. Output: PCM, the set-up data and the information records.
 //
@@ -50,18 +50,18 @@ struct ogg_scan {
     int32_t header_bytes[kVorbisHeaders];
     int32_t headers;       // header packets found so far
     long next_page;        // expected number of the next page
-    bool gap;              // pages are missing since the last granule position
+    bool gap;              // pages are missing after the last granule position
     bool open;             // a packet has begun and not ended
     int64_t packet_at;     // logical offset of the open packet
     int32_t packet_bytes;  // size of the open packet so far
     uint8_t packet_first;  // first byte of the open packet
     bool has_base;
     int64_t base;      // granule position of sample 0; valid if has_base
-    int64_t page_end;  // end of the audio at the second-to-last page with a granule position
+    int64_t page_end;  // end of the audio before the last page with a granule position
     int64_t last_end;  // end of the audio at the last granule position, sample frames
 };
 
-// Copies the start of a header packet, at least kNameBytes. Returns false if it is not Vorbis.
+// Copies the first `bytes` (at least kNameBytes) of a header. Returns false if it is not Vorbis.
 bool read_header(const ogg_scan *scan, int32_t number, uint8_t *packet, int32_t bytes) {
     return stream_copy(scan->file, scan->info, scan->header_at[number], packet, bytes) == bytes &&
            packet[0] == 2 * number + 1 && memcmp(packet + 1, "vorbis", kNameBytes - 1) == 0;
@@ -121,8 +121,8 @@ bool add_packet(ogg_scan *scan) {
                            packets->count > 0 ? samples : 0);
 }
 
-// Applies the first granule position, which determines where the stream starts. Audio in excess of
-// it is cut off at the start, or at the end if the stream ends on this page.
+// Applies the first granule position, which determines where the stream starts. Surplus audio is
+// cut off at the start; if the stream ends on this page, cut_end cuts it off at the end.
 void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     frame_index *packets = &scan->info->frames;
     const int64_t surplus = frame_index_end(packets) - granule;
@@ -201,7 +201,7 @@ bool add_page(ogg_scan *scan, ogg_page *page, int64_t body_at) {
 bool cut_end(ogg_scan *scan) {
     frame_index *packets = &scan->info->frames;
     if (!scan->has_base) return packets->count > 0;
-    // A final position before the end of the second-to-last page indicates damage and is ignored.
+    // A final granule position before the last page's audio indicates damage and is ignored.
     const int64_t end = std::max(scan->last_end, scan->page_end);
     for (int64_t i = packets->count - 1; i >= 0 && frame_index_end(packets) > end; --i) {
         frame_entry &entry = packets->entry[i];

@@ -40,7 +40,7 @@ struct codec_library {
     // `setup` is the three header packets in Xiph's packing. Returns null on failure.
     vorbis_parser *(*parser_open)(const uint8_t *setup, int32_t setup_bytes);
     void (*parser_close)(vorbis_parser *parser);  // null is allowed
-    // Returns the next packet's sample frames, given its first byte; 0 or less if it is not audio.
+    // Returns the number of sample frames of a packet that starts with `first`; <= 0 if not audio.
     int32_t (*parser_samples)(vorbis_parser *parser, uint8_t first);
 };
 

@@ -7,7 +7,7 @@
 
 bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples) {
     constexpr int64_t kFirstCapacity = 1024;  // entries
-    constexpr int64_t kMaxFrames = 1 << 22;   // more than a day of audio has
+    constexpr int64_t kMaxFrames = 1 << 22;   // more frames than a day of audio has
     const int64_t first = frame_index_end(index);
     if (first > kMaxSamples || index->count == kMaxFrames) return false;
     if (index->count == index->capacity) {

@@ -27,7 +27,7 @@ int64_t read_raw(io_file *f, int64_t offset, uint8_t *buf, int64_t count) {
     return done;
 }
 
-// Refills the block so that it starts at `offset`. Keeps the bytes that it already has.
+// Refills the block so that it starts at `offset`. Reuses the bytes that are already in it.
 bool fill_block(io_file *f, int64_t offset) {
     const int64_t block_end = f->block_at + f->block_got;
     int32_t keep = 0;

@@ -27,8 +27,8 @@ bool io_file_open(io_file *f, const mtsrc_io *io);
 // Releases what *f owns. Does nothing for a zeroed or closed record.
 void io_file_close(io_file *f);
 
-// Copies up to `count` bytes at `offset`. Returns the number of bytes copied, which is smaller only
-// at the end of the file, or -1 on a read error. Large copies bypass the buffer.
+// Copies up to `count` bytes at `offset`. Returns the number of bytes copied, or -1 on a read
+// error. Copies fewer bytes only at the end of the file. Large copies bypass the buffer.
 int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count);
 
 // Returns the buffered bytes at `offset`, valid until the next call, and stores their count in

@@ -26,9 +26,9 @@ struct stream_info {
     int64_t delay;         // sample frames that the source drops at the start; seeks and the
                            // duration do not count them
 
-    // To deliver frame n, a fresh decoder must start earlier: at the first frame of n's group if
-    // there are groups, then `preroll` frames before that, then as many more as contain `reservoir`
-    // bytes of payload. Each group has its own decoder.
+    // To deliver frame n, a fresh decoder must start earlier. Count back from n, or from the first
+    // frame of its group: first `preroll` frames, then as many as contain `reservoir` bytes of
+    // payload. Each group has its own decoder.
     int32_t group;  // frames in a group, or 0 if there are no groups
     int32_t preroll;
     int32_t reservoir;

@@ -11,7 +11,7 @@ namespace {
 
 constexpr int32_t kFailed = -3;  // a read error
 
-// Returns the first frame to decode so that frame n is bit-identical to that of a linear read.
+// Returns the first frame to decode so that frame n is bit-identical to a linear read of it.
 int64_t first_needed(const stream_info *info, int64_t n) {
     if (info->group > 0) n -= n % info->group;
     n = std::max<int64_t>(n - info->preroll, 0);
@@ -35,7 +35,7 @@ int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     return held == -1 ? 0 : held;
 }
 
-// Decodes frame r->next. A fresh decoder first decodes the frames that this one depends on.
+// Decodes frame r->next. A fresh decoder first decodes the frames that this frame depends on.
 int32_t decode_next(stream_reader *r) {
     const stream_info *info = r->info;
     int64_t n = r->next;

@@ -22,8 +22,8 @@ struct stream_reader {
 // not have this format or cannot be read, if libavcodec is missing or if memory runs out.
 stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration);
 
-// Copies bytes from an offset as stored in frame_entry, which is logical for Ogg. Returns the
-// number of bytes copied, fewer if the pages or the file end first; -1 on a read error.
+// Copies bytes. `offset` is that of a frame_entry, so for Ogg it is logical. Returns the number of
+// bytes copied, fewer if the pages or the file end first; -1 on a read error.
 int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
                     int64_t bytes);
 

@@ -10,7 +10,7 @@ int64_t seek_target(int64_t units, int64_t end, int32_t rate) {
     if (units <= 0) return 0;
     if (units >= units_from_samples(end, rate)) return end;
     // The time of a sample is rounded up, so the wanted sample is the first one that starts after
-    // the previous unit.
+    // the time units - 1.
     const int64_t before = units - 1;
     return before / kUnits * rate + before % kUnits * rate / kUnits + 1;
 }

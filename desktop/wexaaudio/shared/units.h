@@ -1,5 +1,5 @@
 // Converts between samples and 100-ns units. A time computed from a sample count converts back to
-// the same count, whether rounded down or to nearest, so reported positions are exact.
+// the same count, whether the result is rounded down or to nearest. Reported positions are exact.
 #ifndef WEXAAUDIO_UNITS_H
 #define WEXAAUDIO_UNITS_H
 

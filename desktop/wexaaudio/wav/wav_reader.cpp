@@ -100,8 +100,8 @@ bool read_chunks(wav_reader *r) {
     return true;
 }
 
-// Fills in the record, from which the source also learns why a file is refused. Returns false and
-// leaves the record empty if the header is too damaged.
+// Fills in the record, which also shows the source why a file is refused. Returns false and leaves
+// the record empty if the header is too damaged.
 bool fill_info(xwav_info *info, const wav_reader *r) {
     if (!r->has_format || r->channels == 0 || r->rate <= 0) return false;
     info->codec = r->tag == kTagPcm    ? kWexaPcm
