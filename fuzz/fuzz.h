@@ -1,5 +1,5 @@
-// Code that the fuzzers share. Each fuzzer turns an input's bytes into valid arguments and aborts
-// if the library breaks a promise. Any audio file can be an input; choices use its last bytes.
+// Code that the fuzzers share. A fuzzer turns an input into valid arguments and aborts if the
+// library breaks a promise. Any audio file can be an input: its last bytes determine the choices.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 
@@ -25,8 +25,8 @@ inline void must(bool condition, const char *promise) {
     abort();
 }
 
-// Reads at most `count` values of one of three kinds: small integers, many of them equal; numbers
-// from 0 to 1; or any bits, including infinities and NaN.
+// Reads at most `count` values: all are small integers, or all are between 0 and 1, or all are
+// arbitrary bit patterns, which include infinities and NaN.
 template <typename T>
 std::vector<T> values(input *in, size_t count) {
     const int scale = in->ConsumeIntegralInRange(0, 2);
@@ -47,7 +47,7 @@ std::vector<T> padded_values(input *in, size_t count) {
     return list;
 }
 
-// Runs one of the functions, chosen by the input.
+// Runs the function that the input selects.
 template <size_t count>
 void run_one(void (*const (&functions)[count])(input *), const uint8_t *data, size_t size) {
     input in(data, size);

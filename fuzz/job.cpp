@@ -1,5 +1,5 @@
 // Fuzzes a complete job with all its threads, for any file and any mode. Some jobs are stopped at a
-// random moment. Bytes generated after the input turn a short song into one that lasts minutes.
+// random moment. Some inputs are followed by generated samples, which make a short song longer.
 #include "fuzz/fuzz.h"
 #include "tests/support/job_harness.h"
 
@@ -7,7 +7,7 @@ namespace {
 
 using fuzz::must;
 
-// Appends clicks over quiet noise as 16-bit samples. In other formats they are arbitrary bytes.
+// Appends 16-bit samples: clicks over quiet noise. Formats other than WAV see arbitrary bytes.
 void pad(std::vector<uint8_t> *song, size_t bytes) {
     uint32_t noise = 1;
     for (size_t i = 0; i < bytes; i += 2) {
@@ -22,7 +22,7 @@ void analyse(TAVO_CTX *tavo, int32_t mode, fuzz::input *in) {
     const bool stop = in->ConsumeIntegralInRange(0, 7) == 7;
     const int32_t length = in->ConsumeIntegral<int8_t>();
     const int32_t max_beats = in->ConsumeIntegral<int8_t>();
-    const uint32_t moment = in->ConsumeIntegral<uint8_t>();  // of a stop
+    const uint32_t moment = in->ConsumeIntegral<uint8_t>();  // time of the stop, in 0.1 ms
     const bool without_callback = stop && moment % 8 == 0;
     if (without_callback) tavo_setcallback(tavo, nullptr);
     must(tavo_analyze(tavo, length, max_beats, 0) == TAVO_OK, "a job starts");

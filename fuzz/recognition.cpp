@@ -1,5 +1,5 @@
-// Fuzzes the recognition of a file's format. Zeros inserted in the middle make a short input reach
-// the scan's limit, 32 KiB.
+// Fuzzes the recognition of a file's format. Some inputs get zeros in the middle, which move their
+// second half to the scan's limit of 32 KiB.
 #include "fuzz/fuzz.h"
 #include "media_source/mtsrc.h"
 
@@ -9,7 +9,7 @@ int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
                                   kMtsrcTypeMpegLayer2, kMtsrcTypeMpegLayer3, kMtsrcTypeFlac,
                                   kMtsrcTypeUnknown};
     fuzz::input in(data, size);
-    const bool far = in.ConsumeIntegralInRange(0, 31) == 31;  // rare, being a hundred times slower
+    const bool far = in.ConsumeIntegralInRange(0, 31) == 31;  // rare: 100 times slower
     const auto gap = far ? in.ConsumeIntegralInRange<size_t>(32'000, 32'764) : 0;
     // Recognition starts at the current file offset.
     const int64_t start = in.ConsumeBool() ? 3 : 0;

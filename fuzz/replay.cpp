@@ -1,6 +1,5 @@
-// replay RUNS DIR...: passes every file in the DIRs to the fuzzer's function, then RUNS inputs
-// derived from them, which are the same each time. After a failure, the file PROGRAM.last contains
-// the input.
+// replay RUNS DIR...: runs the fuzzer on every file in each DIR, then on RUNS other inputs, which
+// are the same each time. After a failure, the file PROGRAM.last contains the input.
 #include <fcntl.h>
 
 #include <ctime>
@@ -18,8 +17,8 @@ size_t below(size_t limit) {
     return limit == 0 ? 0 : random_numbers() % limit;
 }
 
-// Returns random bytes, or a kept input with random choices at its end and some bytes changed (half
-// of the time only near its start). Either may be truncated.
+// Returns random bytes or a variation of a kept input. A variation may be truncated. Its last
+// bytes, which determine the fuzzer's choices, are random, and a few other bytes are changed.
 bytes next_input(const std::vector<bytes> &kept) {
     const auto random_byte = [] { return static_cast<uint8_t>(random_numbers()); };
     const bool random_only = below(2) == 0;

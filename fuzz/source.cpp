@@ -1,5 +1,5 @@
-// Fuzzes media sources with any file. A stream must have its stated duration, and reads of any size
-// from any position must return the same bytes.
+// Fuzzes media sources with any file. A stream must have its stated duration. Requests of different
+// sizes from one position must return the same bytes.
 #include "common/tavo_ctx.h"
 #include "fuzz/fuzz.h"
 #include "media_source/mtsrc_ctx.h"
@@ -10,7 +10,7 @@ using fuzz::must;
 
 constexpr int32_t kBuffer = 2 * kQueueBytes;
 constexpr int32_t kNeverWritten = INT32_MIN;
-constexpr int64_t kUnknownOffset = -1;  // value of stream.at after a failure
+constexpr int64_t kUnknownOffset = -1;  // value of stream.at after a failure or a reset
 
 struct stream {
     mtsrc_ctx *src = nullptr;

@@ -1,5 +1,5 @@
-// Fuzzes the stages of the analysis. Checks properties of their results and compares them with
-// plain implementations. Threads cannot start here: the calling thread does all work.
+// Fuzzes the stages of the analysis: checks properties of the results and compares some with plain
+// implementations. All attempts to start a thread fail, so the calling thread does all work.
 #include <pthread.h>
 
 #include <cerrno>
@@ -74,8 +74,8 @@ int64_t convert_by_definition(const dorn_resampler_state &s, const std::vector<i
     }
 }
 
-// Compares the interpolator (for several channels) and complete conversions with plain ones. A
-// conversion outputs the interpolator's samples or block means, followed by zeros.
+// Compares the interpolator (up to three channels) and complete conversions (mono) with plain ones.
+// A complete conversion outputs interpolated samples or block means, followed by zeros.
 void convert(fuzz::input *in) {
     const auto state = std::make_unique<dorn_resampler_state>();
     const int32_t target = in->ConsumeBool() ? kAnalysisRate : choose_rate(in);

@@ -87,9 +87,8 @@ std::vector<int64_t> peaks_of(const std::vector<T> &x) {
     return peaks;
 }
 
-// Checks that `out` contains the `expected` positions, followed by the peaks in descending order of
-// height, except those within `radius` of an earlier position. `out` has at most max_count entries.
-// Peaks of equal height may be in any order.
+// Checks that `out` contains the `expected` positions and then the other peaks, highest first.
+// Peaks within `radius` of an earlier entry must be missing. Equal peaks may be in any order.
 template <typename T, typename Index>
 void check_peaks(const std::vector<T> &x, const std::vector<Index> &out,
                  std::vector<int64_t> expected, int64_t radius, size_t max_count = SIZE_MAX) {
@@ -149,7 +148,7 @@ void find_priority_peaks(fuzz::input *in) {
     if (count < 0) return;
     out.resize(static_cast<size_t>(count));
     const std::vector<int64_t> peaks = peaks_of(x);
-    std::vector<int64_t> pinned;  // the peak nearest to each position, except the last peak
+    std::vector<int64_t> pinned;  // the nearest peak to each position, unless it is the last peak
     for (const int32_t position : priority) {
         if (peaks.size() < 2) break;
         const int64_t nearest = *std::min_element(

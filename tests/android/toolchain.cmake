@@ -1,5 +1,5 @@
-# Replaces the NDK's toolchain file. Sets the same variables (ANDROID, the processor, a compiler that finds Android's
-# jni.h and log library), but uses Debian's cross compiler and C library.
+# Replaces the NDK's toolchain file. Sets the same variables and makes the compiler find Android's jni.h and log
+# library, but uses Debian's cross compiler and C library.
 include(${CMAKE_CURRENT_LIST_DIR}/../../cmake/aarch64.cmake)
 unset(JAVA_INCLUDE_PATH CACHE)
 unset(JAVA_INCLUDE_PATH2 CACHE)

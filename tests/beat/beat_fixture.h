@@ -17,7 +17,7 @@
 
 constexpr double kHop = 256.0 / 11025.0;  // seconds
 
-// An instance with an analysis signal, as it is while a job runs. It writes no click track.
+// An instance in the state of a running job, with an analysis signal and without a click track.
 struct analysis {
     TAVO_CTX ctx = {};
     std::vector<double> ana;
@@ -54,7 +54,7 @@ inline double uniform(std::mt19937 *random) {
     return static_cast<double>((*random)()) / 2147483648.0 - 1.0;
 }
 
-// Returns random samples of one of five kinds: values from -1 to 1, values of any magnitude up to
+// Returns random samples, all of one kind: values from -1 to 1, values of any magnitude below
 // 2^highest, mostly zeros, denormal numbers, or zeros of both signs.
 inline std::vector<double> extreme_samples(size_t n, int highest, std::mt19937 *random) {
     std::vector<double> samples(n);

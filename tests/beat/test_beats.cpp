@@ -13,7 +13,7 @@ using namespace std::string_literals;
 int starts_until_stop = 0;  // the stop arrives after this many thread starts
 int32_t *stop_flag = nullptr;
 
-// Returns a song of drum hits. Each fades out until the next, and neighbours differ in loudness.
+// Returns a song of drum hits. Each hit fades until the next one, which has another level.
 std::vector<double> drum_song(double bpm, double seconds) {
     std::vector<double> song(static_cast<size_t>(seconds * kAnalysisRate));
     std::mt19937 random(4);
@@ -44,7 +44,7 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 }  // namespace
 
-// The onset where quiet noise becomes loud comes first, although later onsets are sharper.
+// A single requested beat is where quiet noise becomes loud, although later onsets are sharper.
 TEST(Beats, PowerRiseForcesABeat) {
     std::mt19937 random(9);
     std::vector<double> song(90 * 11025);
@@ -59,7 +59,6 @@ TEST(Beats, PowerRiseForcesABeat) {
     EXPECT_NEAR(run.ctx.onset->beat_times[0], 50000.0, 100.0);
 }
 
-// A stop takes effect before the envelope and after the tempo, but not later.
 TEST(Beats, StopIsCheckedBeforeTheEnvelopeAndAfterTheTempo) {
     for (const auto &[start, tempo, beats] :
          {std::tuple{0, false, false}, {1, true, false}, {5, true, true}}) {
@@ -82,8 +81,8 @@ TEST(Beats, StopIsCheckedBeforeTheEnvelopeAndAfterTheTempo) {
     fault::disarm();
 }
 
-// The file holds the signal at half its level, rounded toward zero, and the blips with a gain of
-// 1.25. A silent or very short signal has a tempo of 90 BPM and no beats.
+// The file is the sum of the signal at half its level, rounded toward zero, and the blips with a
+// gain of 1.25. A silent or very short signal has a tempo of 90 BPM and no beats.
 TEST(Beats, FileContainsHalfTheSignalAndTheBlips) {
     for (const size_t n : {0u, 1u, 511u, 512u, 767u, 11025u, 132300u}) {
         std::vector<double> signal(n, n < 768 ? 1001.0 : 0.0);
@@ -93,7 +92,7 @@ TEST(Beats, FileContainsHalfTheSignalAndTheBlips) {
         const std::string file = analyse_to_file(&run);
         const TAVO_ONSET_CTX *onset = run.ctx.onset;
         EXPECT_EQ(onset->bpm == 90 && onset->beat_times == nullptr, n <= 11025) << n;
-        EXPECT_NEAR(onset->bpm, n > 11025 ? 120 : 90, 3);  // 123 or 117: periods are whole hops
+        EXPECT_NEAR(onset->bpm, n > 11025 ? 120 : 90, 3);  // beat periods are whole hops
         EXPECT_EQ(run.ctx.state, kStateFinished) << n;
         ASSERT_EQ(file.size(), 44 + 2 * n);
         if (n == 512) {  // 16-bit PCM, mono, 11025 Hz
@@ -117,7 +116,7 @@ TEST(Beats, FileContainsHalfTheSignalAndTheBlips) {
     clearOnsetCtx(nullptr);
 }
 
-// A blip is a tone of 4 kHz with the envelope i e^(-i/110) / 160 at sample i.
+// The expected samples are those of a 4 kHz tone with the envelope i e^(-i/110) / 160 at sample i.
 TEST(ClickTrack, BlipIsADecayingTone) {
     const std::vector<float> track = track_of({1000.04f}, 20000);
     EXPECT_EQ(track[11025], 0.0f);
@@ -126,8 +125,8 @@ TEST(ClickTrack, BlipIsADecayingTone) {
     EXPECT_NEAR(*std::max_element(track.begin(), track.end()), 0.253, 0.002);
 }
 
-// A blip starts at the sample nearest to its beat. Its end is cut off so that the last sample of
-// the track stays free. A beat up to 1.5 samples before the track starts at sample 0.
+// A blip starts at the sample nearest to its beat. If it does not fit, it is cut off one sample
+// before the end of the track. A beat up to 1.5 samples before the track has its blip at sample 0.
 TEST(ClickTrack, BlipsAreCutAtTheEnd) {
     struct part {
         size_t at, length;  // samples

@@ -11,8 +11,8 @@ struct peak {
     double height;
 };
 
-// An envelope of peaks. Each of the `unselected` ones is below the threshold, because a plateau of
-// larger values follows it.
+// An envelope of peaks. A plateau of larger values follows each `unselected` peak and raises the
+// threshold above the peak.
 struct envelope {
     int64_t length;
     int32_t bpm;
@@ -22,7 +22,7 @@ struct envelope {
     float frame_s = static_cast<float>(kHop);
 };
 
-// Returns the analysis frames whose peaks became beats. A beat is two hops after its frame's start.
+// Returns the analysis frames whose peaks became beats. A beat is two hops after the frame's start.
 frames find_beats(const envelope &env) {
     working_context work(env.length);
     TAVO_BEAT_CTX *beat = &work.beat;
@@ -50,7 +50,7 @@ frames find_beats(const envelope &env) {
 
 }  // namespace
 
-// Beats are at least 43 frames apart at 120 BPM. max_beats -1 and 0 mean no limit.
+// At 120 BPM, beats are at least 43 frames apart. Without a limit, max_beats is 0 or -1.
 TEST(Candidates, LargerPeaksComeFirst) {
     EXPECT_EQ(find_beats({1, 90, {}}), frames{});
     EXPECT_EQ(find_beats({500, 0, {{100, 5}}}), frames{});
@@ -67,15 +67,15 @@ TEST(Candidates, LargerPeaksComeFirst) {
     }
 }
 
-// At 40 BPM the threshold's window has 258 frames, one more than the song. The threshold then
-// changes linearly towards the end, so that a peak there needs a height between 5.6 and 5.7.
+// At 40 BPM, the threshold's window is one frame longer than this song, so it is cut. The threshold
+// of the peak near the end is between 5.6 and 5.7.
 TEST(Candidates, WindowThatNearlyFitsIsCut) {
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.6}}, {}, 0, 8}), frames{});
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
 }
 
-// Beats are at least 3 s apart up to 95 BPM, otherwise 1 s, rounded up to whole beat periods. A gap
-// is filled if it exceeds three of these distances or lasts 6 s.
+// The smallest distance of beats is 3 s up to 95 BPM and 1 s above, rounded up to whole beat
+// periods. A gap is filled if it exceeds three such distances or lasts 6 s.
 TEST(Candidates, SmallestDistanceAndLongGapDependOnTheTempo) {
     const std::tuple<int32_t, int64_t, int64_t, size_t> cases[] = {
         {96, 52, 0, 1},    {96, 53, 0, 2},    {95, 134, 0, 1},   {95, 135, 0, 2},
@@ -88,7 +88,8 @@ TEST(Candidates, SmallestDistanceAndLongGapDependOnTheTempo) {
     }
 }
 
-// A rise selects the nearest peak, except the last one. Other peaks near it are ignored.
+// The peak nearest to a rise becomes a beat, and other peaks near it are ignored. If the nearest
+// peak is the song's last one, the highest peak becomes a beat instead.
 TEST(Candidates, RiseNeedsNoThreshold) {
     envelope env = {1000, 120, {{100, 20}, {400, 21}}, {{300, 2}, {330, 3}}};
     EXPECT_EQ(find_beats(env), (frames{100, 330, 400}));
@@ -102,11 +103,11 @@ TEST(Candidates, LongGapsGetTheirStrongestPeaks) {
     envelope env = {
         1000, 120, {{100, 20}, {800, 21}}, {{200, 1}, {300, 2}, {400, 3}, {500, 4}, {600, 5}}};
     EXPECT_EQ(find_beats(env), (frames{100, 200, 300, 400, 500, 600, 800}));
-    env.unselected.push_back({700, 2.5});  // a gap gets at most five, so not the weakest
+    env.unselected.push_back({700, 2.5});  // a gap gets its five strongest
     EXPECT_EQ(find_beats(env), (frames{100, 300, 400, 500, 600, 700, 800}));
 }
 
-// Twelve gaps could take five peaks each, but no gap is filled after the first 46 added beats.
+// Each of the twelve gaps has five peaks. No gap is filled after the 46th added beat.
 TEST(Candidates, AtMostFiftyBeatsAreAdded) {
     envelope env = {4300, 120, {}};
     for (int64_t k = 0; k <= 12; ++k) {
@@ -121,7 +122,7 @@ TEST(Candidates, AtMostFiftyBeatsAreAdded) {
     EXPECT_EQ(find_beats(env).size(), 3u + 10u);
 }
 
-// Instead of two equal peaks the first one is returned twice.
+// If two peaks are equal, the first one is returned twice.
 TEST(Candidates, EqualPeaksAppearTwice) {
     const double heights[] = {0, 1, 0, 3, 0, 9, 0, 3, 0, 2};
     const int32_t peaks[] = {1, 3, 5, 7, 9};

@@ -80,7 +80,7 @@ TEST(BeatCtx, OneSecondHas42Frames) {
     EXPECT_EQ(beat.signal[3], -32768.0 / 32767.0);
     EXPECT_EQ(beat.signal[11024], 0.5);
     EXPECT_EQ(std::count(beat.rise_flags, beat.rise_flags + 11025, 0), 11025);
-    // The lowest mel band is a triangle from 0 to 143 Hz, whose area is 1. It covers eight bins.
+    // The lowest mel band covers eight bins: a triangle from 0 to 143 Hz with an area of 1.
     const float lowest[] = {0.0f,       0.0041836f, 0.0083671f, 0.0125507f,
                             0.0111427f, 0.0069591f, 0.0027756f, 0.0f};
     for (int bin = 0; bin < 8; ++bin) EXPECT_NEAR(beat.mel_matrix[bin][0], lowest[bin], 1e-6);

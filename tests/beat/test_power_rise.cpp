@@ -5,8 +5,8 @@ namespace {
 
 constexpr size_t kBlock = 5512;
 
-// Returns the level of each sample in dB. At the last sample of a block it is the largest level of
-// the block, which is also stored in *block. Samples without a level have -150 dB.
+// Returns the level of each sample in dB, or -150 if it has none. The last sample of each block has
+// the block's largest level, which is also stored in *block.
 std::vector<double> plain_levels(const std::vector<double> &signal, std::vector<double> *block) {
     std::vector<double> db(signal.size(), -150.0);
     block->assign(signal.size() / kBlock + 1, -150.0);
@@ -51,7 +51,7 @@ std::vector<int32_t> plain_rises(const std::vector<double> &signal) {
         while (i <= kBlock * b && !(db[i] >= target)) ++i;
         if (i > kBlock * b) continue;
         flags[i] = 1;
-        b += 6;  // besides the ++b of the loop
+        b += 6;  // in addition to the loop's ++b
     }
     return flags;
 }
@@ -69,8 +69,8 @@ std::vector<double> changing_noise(size_t n, std::mt19937 *random) {
 
 }  // namespace
 
-// Half the signals end near a block boundary. They are noise of changing loudness or have extreme
-// values, NaN or infinities. In some the means are whole numbers, so that rounding matters.
+// The signals are noise of changing loudness or have extreme values, NaN or infinities. Half of
+// them end near a block boundary. In some, the means are whole numbers, so that rounding matters.
 TEST(PowerRise, EqualsThePlainSearch) {
     std::mt19937 random(7);
     int found = 0;

@@ -22,8 +22,8 @@ int32_t estimate(std::vector<double> env, const std::vector<pulse_pair> &pairs =
 
 }  // namespace
 
-// Each pair of pulses correlates only at its own lag. A lag of 20 frames is 129 BPM, 27 is 95 BPM.
-// If two rows differ only slightly in a weight, a different tempo wins.
+// Each pair of pulses correlates only at its own lag: 20 frames are 129 BPM, 27 are 95 BPM. Two
+// rows that differ only in a weight show where another tempo begins to win.
 TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     const struct {
         std::vector<std::pair<size_t, double>> weights;  // of each lag
@@ -31,18 +31,18 @@ TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     } cases[] = {
         {{{13, 1}}, 198},
         {{{12, 1}}, 90},            // 215 BPM is outside the range
-        {{{18, 1}, {26, 1}}, 143},  // on either side of 120 BPM, where the weight is largest
+        {{{18, 1}, {26, 1}}, 143},  // on both sides of 120 BPM, which is preferred
         {{{18, 1}, {26, 1.01}}, 99},
-        // The correlations at twice the lag and beside it raise the score.
+        // Correlations at twice the lag and at its neighbours raise the score.
         {{{20, 1}, {40, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {40, 1}, {27, 1.42}}, 95},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.371}}, 129},
         {{{20, 1}, {39, 1}, {41, 1}, {27, 1.434}}, 95},
-        // The correlations at three times the lag and beside it raise the score too.
+        // Correlations at three times the lag and at its neighbours raise the score, too.
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.385}}, 129},
         {{{20, 1}, {59, 1}, {60, 1}, {61, 1}, {27, 1.413}}, 95},
         {{{20, 1}, {59, 1}, {27, 1.1}}, 129},
-        // The faster tempo wins if more than 0.53 of the sum of both correlations is its own.
+        // A tempo wins over half that tempo unless the slower one correlates much more.
         {{{20, 1}, {40, 1.30}}, 129},
         {{{20, 1}, {40, 1.33}}, 64},
         // These are the longest lags.
@@ -69,12 +69,12 @@ TEST(Tempo, DependsOnOneMinuteOnly) {
     }
 }
 
-// The tempo of regular pulses is found in short excerpts too. A song without a period, such as
-// silence, has 90 BPM, and calc_bpm_acf returns a value above every tempo.
+// Regular pulses have a tempo even in a short excerpt. A song without a period, such as silence,
+// has 90 BPM; calc_bpm_acf then returns a value above every tempo.
 TEST(Tempo, ShortExcerptsAndSilenceHaveATempo) {
     for (const auto &[length, period, bpm] :
          {std::tuple{1290u, 20u, 129},  // half a minute
-          {42u, 20u, 129},              // one second: more lags than the transform has values
+          {42u, 20u, 129},              // one second
           {10u, 4u, 80}}) {             // pulses 4 frames apart also match at a lag of 32
         std::vector<double> env(length);
         for (size_t i = 0; i < length; i += period) env[i] = 1.0;

@@ -41,7 +41,7 @@ def wav(seconds=2.0, rate=44100, channels=1, bits=16, tag=1, data_size=None, sam
     return head + b"data" + struct.pack("<I", size) + data
 
 
-# Start of a command line with which file permissions also apply to root.
+# Placed before a command, makes root obey file permissions.
 AS_ORDINARY_USER = [] if os.getuid() != 0 else [
     "setpriv", "--inh-caps=-all", "--bounding-set=-dac_override,-dac_read_search"]
 
@@ -98,7 +98,7 @@ class Case(unittest.TestCase):
         self.fail("it did not happen within a minute")
 
     def objects(self, text):
-        """Parses lines of one JSON object each. They must be valid UTF-8 without NaN or infinity."""
+        """Parses one JSON object per line. The text must be valid UTF-8 without NaN or infinity."""
         self.assertTrue(text == b"" or text.endswith(b"\n"), text)
         return [json.loads(line.decode("utf-8"), parse_constant=self.fail)
                 for line in text.split(b"\n")[:-1]]

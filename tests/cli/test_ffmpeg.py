@@ -1,4 +1,4 @@
-"""Tests that ffmpeg decodes files that the library refuses and cuts clips, and that offset_ms gives players' times."""
+"""Tests clips and decoding with ffmpeg, and the offset between the command's times and a player's."""
 import os
 import pathlib
 import signal
@@ -34,7 +34,7 @@ NAMING_OTHERS = {"a.m3u8": b"#EXTM3U\n#EXT-X-TARGETDURATION:60\n#EXTINF:60,\na.t
 
 
 def find(part, sound):
-    """Returns the sample at which the part best matches the sound."""
+    """Returns the index in `sound` at which `part` fits best."""
     size = len(part) + len(sound)
     return np.fft.irfft(np.fft.rfft(sound, size) * np.fft.rfft(part, size).conj(), size).argmax()
 
@@ -73,7 +73,7 @@ class Ffmpeg(Case):
         self.assertEqual(len(os.listdir(self.folder / "clips")), len(CLIPPED))
 
     def test_offset_is_the_delay_of_the_library(self):
-        """Finds part of the noise in a player's sound and in the library's."""
+        """Finds part of the noise in the audio that a player plays and in the audio that the library decodes."""
         noise = np.random.default_rng(1).normal(0, 9000, 6 * RATE)
         samples = np.clip(noise + np.roll(noise, 1), -32768, 32767).astype("<i2").repeat(2)  # stereo
         self.put("n.wav", wav(channels=2, seconds=0)[:40] + samples.nbytes.to_bytes(4, "little") + samples.tobytes())
@@ -83,12 +83,12 @@ class Ffmpeg(Case):
             path = self.folder / name
             if name == "edited.m4a":  # its edit list states the delay of Apple's encoder
                 self.put(name, path.read_bytes().replace(b"\0\0\4\0\0\1\0\0", b"\0\0\x08\x40\0\1\0\0", 1))
-            if name == "tagged.m4a":  # Apple's tag states that delay, which overrides the edit list
+            if name == "tagged.m4a":  # Apple's tag states the same delay and overrides the edit list
                 tag = b"".join((len(atom) + 4).to_bytes(4, "big") + atom for atom in (
                     b"mean\0\0\0\0com.apple.iTunes", b"name\0\0\0\0iTunSMPB", b"data\0\0\0\1\0\0\0\0 00000000 00000840 00000000 00040998"))
                 before, comment = path.read_bytes().split(b"\xa9cmt", 1)
                 self.put(name, before + b"----" + tag + comment[len(tag):])
-            (result,) = self.run_json("-m", "beats", "--force", "--click", "click.wav", name)  # its clicks are quiet
+            (result,) = self.run_json("-m", "beats", "--force", "--click", "click.wav", name)  # the clicks are quiet
             late = (find(part, self.sound("click.wav")) - find(part, self.sound(name, "anull"))) * 1000 / RATE
             self.assertAlmostEqual(result["offset_ms"], late, delta=0.2, msg=name)
             self.assertEqual(result["offset_ms"], OFFSETS.get(name, 0), name)

@@ -24,8 +24,8 @@ FCPXML = {  # elements and their required attributes, from Final Cut Pro's DTD
 
 
 def timecodes(base, dropped):
-    """Returns the frame number of each timecode, from one hour on. Drop-frame timecode skips the first frame numbers
-    of each minute, except every tenth minute."""
+    """Maps the timecodes of five minutes, from one hour on, to frame numbers. Drop-frame timecode skips the first frame
+    numbers of each minute, except every tenth minute."""
     places = ((minute, second, frame) for minute in range(5) for second in range(60) for frame in range(base)
               if second or frame >= dropped or minute % 10 == 0)
     return {f"01:{minute:02}:{second:02}{';' if dropped else ':'}{frame:02}": number
@@ -50,7 +50,7 @@ class Markers(Case):
         self.put(NAME, source=standard_song())
 
     def write(self, form, words, only=""):
-        """Writes a marker file. Returns its path and the expected marks: their start, end (in seconds) and name."""
+        """Writes a marker file. Returns its path and the expected marks: (start, end, name), in seconds."""
         (result,) = self.run_json(*words.split(), NAME)
         done = self.run_tavo("--format", form, "--force", *only.split(), *words.split(), NAME)
         late = self.late = result["offset_ms"]

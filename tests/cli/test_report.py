@@ -114,7 +114,7 @@ class Report(Browser):
         page = view("steps.wav", "--mode", "highlight")
         wave = page["wave"]  # pairs for 4000 columns of 2.5 ms; the wave starts at column 1600
         self.assertEqual((len(wave), {*wave[:3198]}, {*wave[3202:]}), (8000, {0}, {-127, 127}))
-        # The wave fills a third, two thirds and all of a window.
+        # The square wave fills a third, two thirds and all of the three windows. The last value is the mean.
         for value, expected in zip([*page["loudness"], page["mean"]], (0.348, 0.669, 0.969, 0.662), strict=True):
             self.assertAlmostEqual(value, expected, delta=0.001)
         for seconds, searched in ((60, [0, 42000]), (100, [18000, 52000])):

@@ -41,7 +41,7 @@ class Store(Case):
             self.assert_same(row, result)
             self.assertEqual([row[key] for key in ("size", "mtime_ns", "mode", "length_s", "max_beats")],
                              [state.st_size, state.st_mtime_ns, "both", 5, 0])
-        # A second run knows all songs, including the failed one.
+        # A second run finds all songs in the store, including the failed one.
         self.run_tavo("--store", "sqlite:x.db", "--format", "json", *words, status=1,
                       message=b"0 stored, 3 known already (1 failed; --retry-failed)", printed=b"")
 

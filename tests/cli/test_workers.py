@@ -48,7 +48,7 @@ class Workers(Case):
         names = [f"{i}.wav" for i in range(10)]
         for i, name in enumerate(names):
             self.put(name, source=short_song(i) if i % 4 else song(seconds=40, seed=i))
-        self.put("5.wav", b"RIFF")  # fails alone
+        self.put("5.wav", b"RIFF")  # the only one that fails
         single = [self.run_json(name, status=int(name == "5.wav"))[0] for name in names]
         for jobs in ("2", "32"):
             self.assertEqual(self.run_json("-j", jobs, *names, status=1), single)
@@ -73,7 +73,7 @@ class Workers(Case):
         self.assertEqual(process.returncode, 1)
 
     def test_workers_end_with_the_command_and_share_no_sockets(self):
-        # A worker ends when the command's end of its socket is closed, so no other worker may hold that end.
+        # When the command ends, its sockets close, which ends the workers. No worker may keep another's socket open.
         process = self.start("-j", "2", "long.wav", "other.wav")
         workers = [self.worker_with(process, name) for name in ("long.wav", "other.wav")]
         sockets = [[to for fd, to in open_files(pid) if fd > 2 and to.startswith("socket:")] for pid in workers]
@@ -85,7 +85,7 @@ class Workers(Case):
                 self.assertTrue(select.select([end], [], [], 60)[0], "the worker goes on")
 
     def test_a_stop_keeps_what_is_finished(self):
-        # A terminal signals the whole group, kill only one process. Results that wait for an earlier file are printed.
+        # A terminal sends a signal to all processes, `kill` to one. Results that wait for an earlier file are printed.
         for send, number, words, busy, finished in (
                 (os.kill, signal.SIGTERM, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
                 (os.killpg, signal.SIGINT, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
@@ -94,7 +94,7 @@ class Workers(Case):
             with self.subTest(words=words, send=send):
                 process = self.start(*words.split())
                 worker = first = self.worker_with(process, "long.wav")
-                if busy != "long.wav":  # suspend it, so that the other file is the first to end
+                if busy != "long.wav":  # suspend this worker, so that the other one does the rest
                     os.kill(first, signal.SIGSTOP)
                     worker = self.worker_with(process, busy)
                 send(process.pid, number)

@@ -25,7 +25,7 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     EXPECT_EQ(loudness != nullptr, mode != TAVO_MODE_BEATS);
     EXPECT_EQ(points, mode != TAVO_MODE_BEATS ? (100 - 6) / 2 + 1 : 0);
     EXPECT_TRUE(loudness == nullptr || loudness[45 / 2] > 2 * loudness[35 / 2]);
-    EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);  // whole hops
+    EXPECT_NEAR(tavo_get_tempo(ctx), mode == TAVO_MODE_HIGHLIGHT ? 0 : 120, 3);  // rounded period
     EXPECT_EQ(tavo_deinit(ctx), 0);
     EXPECT_STREQ(job::find_inconsistency(job::last, mode), nullptr);
     EXPECT_EQ(result.status, 0);
@@ -52,7 +52,7 @@ TEST(Jobs, BeatsFallOnTheDrums) {
     EXPECT_GE(on_hits * 10, result.beat_count * 9);
 }
 
-// Mode 2 finds the same beats as mode 1 in a copy of the file that starts at the highlight.
+// The beats of mode 2 are those of mode 1 for a copy of the song from the highlight on.
 TEST(Jobs, BothFindsTheBeatsOfTheRestOfTheFile) {
     const job::result both = run(core_song::whole().path, TAVO_MODE_BOTH, 7);
     ASSERT_GT(both.hl_pos, 1000);
@@ -69,7 +69,7 @@ int32_t read_nothing(mtsrc_ctx *, int32_t, mtsrc_frame *) {
     return TAVO_ERR_READ;
 }
 
-// Only the modes with beats report a failure. A highlight may have been found before it.
+// Only the modes with beats report a failure. If only the conversion fails, the highlight is found.
 TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     for (const bool decodes : {false, true}) {
         for_each_mode(kModes, [decodes](int32_t mode, TAVO_CTX *ctx) {

@@ -121,7 +121,7 @@ struct {
 void wait_for_tavo_deinit(TAVO_INFO *) {
     callback_state.deinit_code = tavo_deinit(callback_state.ctx);
     callback_state.entered = true;
-    while (pthread_mutex_trylock(&tavo_mutex) == 0) {  // until the test's tavo_deinit holds it
+    while (pthread_mutex_trylock(&tavo_mutex) == 0) {  // until the test's tavo_deinit locks it
         pthread_mutex_unlock(&tavo_mutex);
         std::this_thread::yield();
     }
@@ -164,7 +164,7 @@ int32_t read_after_stop(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame) {
     return original_get_frm(src, want, frame);
 }
 
-// A stop during decoding skips only the beats. It also works without a watcher thread.
+// A stop during decoding skips only the beats, even if the thread that awaits the job cannot start.
 TEST(Lifecycle, StopDuringDecodingSkipsTheBeats) {
     for (const bool watched : {true, false}) {
         for_each_mode(kModes, [watched](int32_t mode, TAVO_CTX *ctx) {
@@ -172,7 +172,7 @@ TEST(Lifecycle, StopDuringDecodingSkipsTheBeats) {
             original_get_frm = ctx->seg[0].src->get_frm;
             for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].src->get_frm = read_after_stop;
             block_callback_of(ctx);
-            // Threads start in this order: the job's, its four decoding threads, the watcher.
+            // Order of thread starts: the job's, four for decoding, the one that awaits the job.
             fault::arm({fault::kThread, watched ? INT64_MAX : 5});
             ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
             while (fault::counted_calls() < 5) std::this_thread::yield();

@@ -21,7 +21,7 @@ using samples = std::vector<int16_t>;
 
 constexpr int64_t kUnits = 10'000'000;  // per second
 
-// Returns the path of a file: golden/NAME is in the source tree, NAME is made for the tests.
+// Returns the path of a song: golden/NAME is in the source tree, other files are generated.
 inline std::string fixture(const std::string &name) {
     const bool golden = name.rfind("golden/", 0) == 0;
     return golden ? CODEC_GOLDEN + name.substr(6) : CODEC_FIXTURES "/" + name;
@@ -42,7 +42,7 @@ inline std::string save(const std::string &name, const std::string &contents) {
     return path;
 }
 
-// A source for a file. If the file cannot be opened, it is null and `error` is the reason.
+// Opens a source for a file. If this fails, `source` is null and `error` is the reason.
 struct open_source {
     mtsrc_ctx *source = nullptr;
     int32_t error = 0;
@@ -73,7 +73,6 @@ inline samples read(mtsrc_ctx *source, size_t limit = SIZE_MAX) {
     return all;
 }
 
-// Reads all samples of a file.
 inline samples read_all(const std::string &path) {
     const open_source file(path);
     EXPECT_NE(file.source, nullptr) << path << ": " << file.error;

@@ -11,10 +11,10 @@ constexpr size_t kSlack = 2 * 4608;       // samples that may differ before the 
 constexpr size_t kRecovery = 3 * 44'100;  // samples that may differ after the damage
 constexpr int kOffsets = 3;
 
-// States when the end of a song, after the damage, must be bit-identical.
+// Condition under which the samples long after the damage must be bit-identical.
 enum end_of_song {
     kNever,    // the decoder's noise depends on earlier frames
-    kInPlace,  // only if no bytes have moved, because the file holds offsets
+    kInPlace,  // if no bytes have moved: the file contains offsets
     kAlways,
 };
 
@@ -43,7 +43,6 @@ std::string damage(std::string file, int kind, size_t at, size_t count, std::mt1
     return file.replace(at, count, bytes);
 }
 
-// These functions return the number of equal samples at the start and at the end.
 size_t count_equal_at_start(const samples &a, const samples &b) {
     const auto differs = std::mismatch(a.begin(), a.end(), b.begin(), b.end()).first;
     return static_cast<size_t>(differs - a.begin());
@@ -63,7 +62,7 @@ TEST_P(DamagedFile, IsUnchangedFarFromTheDamage) {
     const samples whole = read_all(fixture(GetParam().file));
     for (int k = 0; k < kOffsets; ++k) {
         const size_t at = file.size() / 4 + random() % (file.size() / 4);
-        // A truncated file has the same samples, except for its last ones.
+        // A truncated file has the same samples up to its end, except the last ones.
         const samples cut = read_all(save("cut", file.substr(0, at)));
         ASSERT_GT(cut.size(), whole.size() / 10);
         ASSERT_LT(cut.size(), whole.size() * 3 / 4);

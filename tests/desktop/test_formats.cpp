@@ -12,8 +12,8 @@ using namespace std::string_literals;
 
 class Stream : public testing::TestWithParam<const char *> {};
 
-// A seek reports the first sample at or after its position. From there on, reads return the same
-// samples as a read from the start.
+// A seek reaches the first sample at or after the requested position. The samples that follow are
+// the same as in a read from the start.
 TEST_P(Stream, SeekReachesTheRequestedSample) {
     constexpr ptrdiff_t kComparedSamples = 30'000;  // samples compared after each seek
     SCOPED_TRACE(GetParam());
@@ -38,7 +38,7 @@ TEST_P(Stream, SeekReachesTheRequestedSample) {
         const int64_t sample = reached * rate / kUnits;
         const int64_t left = static_cast<int64_t>(linear.size()) - sample;
         ASSERT_GE(left, 0);
-        // The requested position is at most one sample before the one reached, except at the end.
+        // `reached` is at most one sample after `position`, or it is the end of the stream.
         ASSERT_TRUE(reached >= position || left == 0) << reached;
         ASSERT_LT(std::max<int64_t>(reached - position - 1, 0) * rate, kUnits) << reached;
         ASSERT_EQ(mtsrc_seekstream(file.source, reached, &again), 0);
@@ -110,14 +110,14 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
                      {reference.begin() + static_cast<ptrdiff_t>(pair.front),
                       reference.end() - static_cast<ptrdiff_t>(pair.end)});
     }
-    // The source of an MPEG file drops the first 529 samples of a stereo stream, but never more
-    // than the first frame, which has 384 samples in Layer I. The source of an MP4 file drops none.
+    // The MPEG source drops the first 529 samples of a stereo stream at 44.1 kHz, but at most one
+    // frame (384 samples in Layer I). The MP4 source drops none.
     EXPECT_EQ(read_all(fixture("stereo3.mp4")).size(), read_all(fixture("cbr.mp3")).size() + 529);
     EXPECT_EQ(read_all(fixture("golden/layer1_44.mp1")).size(), 19U * 384);
     EXPECT_EQ(read_all(fixture("golden/layer1_48.mp1")).size(), 20U * 384);
 }
 
-// Returns the downmix of a song by ffmpeg, rounded to 16 bits.
+// Returns ffmpeg's downmix of a song, rounded to 16 bits.
 samples mix_with_ffmpeg(const std::string &song, const std::string &channels) {
     const std::string path = save("mixed.raw", "");
     const std::string command = "ffmpeg -nostdin -v error -y -i " + fixture(song) +
@@ -132,8 +132,8 @@ samples mix_with_ffmpeg(const std::string &song, const std::string &channels) {
     return out;
 }
 
-// The songs are long enough that the decoder is replaced several times. They have no substituted
-// noise. One exceeds full scale, and one has blocks that are larger than the buffers of the source.
+// The songs are so long that the reader replaces its decoder several times. They have no noise
+// substitution. One exceeds full scale. One has blocks that are larger than the source's buffers.
 TEST(Reader, AgreesWithFfmpeg) {
     const struct {
         const char *file, *reference, *channels;
@@ -220,8 +220,7 @@ TEST(Reader, SkipsTagsAndGarbage) {
         std::string contents;
         samples expected;
     } tagged[] = {
-        {id3v2 + id3v2 + file.substr(0, 30) + file + ape + id3v1,
-         plain},  // the bytes after the tags begin with half a frame
+        {id3v2 + id3v2 + file.substr(0, 30) + file + ape + id3v1, plain},  // part of a frame first
         {id3v2 + load(fixture("golden/plain.aac")), read_all(fixture("golden/plain.aac"))},
         {id3v2 + load(fixture("song.flac")) + id3v1, read_all(fixture("song.wav"))},
         {ogg + ogg, read_all(fixture("golden/plain.ogg"))},  // only the first stream

@@ -1,4 +1,4 @@
-// Tests that libwexaaudio.so loads its shared object on demand, and that its readers share scans.
+// Tests that libwexaaudio.so loads libwexaaudio_av.so on demand, and that its readers share scans.
 #include <dlfcn.h>
 
 #include <cstdlib>
@@ -36,7 +36,7 @@ TEST(Library, LoadsLibavcodecWhenNeeded) {
     EXPECT_TRUE(has_libavcodec());
 }
 
-// A copy of the library, in a folder without the shared object, cannot load it.
+// A copy of libwexaaudio.so in another folder cannot find libwexaaudio_av.so.
 TEST(Library, LogsAMissingSharedObject) {
     Dl_info info = {};
     ASSERT_NE(dladdr(reinterpret_cast<void *>(xaac_init), &info), 0);
@@ -55,8 +55,8 @@ TEST(Library, LogsAMissingSharedObject) {
     dlclose(library);
 }
 
-// Readers of a file share one scan until the file is replaced. The scan outlives them, unless the
-// file was written just before it.
+// Readers of a file share one scan until the file is replaced. The scan is kept when they are
+// closed, unless the file was written just before the scan.
 TEST(ScanCache, ScansAFileOnce) {
     static int64_t bytes_read;
     std::string tags;  // many short tags after the audio

@@ -63,7 +63,7 @@ TEST(Sort, RecursionIsShallowOnTheWorstInput) {
     pthread_attr_destroy(&small);
 }
 
-// The single-precision sum of `large` is rounded to an even number.
+// In single precision, adding 1 to the first value of `large` does not change it.
 TEST(Stats, PopulationDeviationInBothPrecisions) {
     const double x[] = {2, 4, 4, 4, 5, 5, 7, 9};
     const float single[] = {2, 4, 4, 4, 5, 5, 7, 9}, large[] = {16777216, 1, 1};

@@ -1,5 +1,5 @@
-// Runs jobs with a codec library that returns wrong values, once or from some call on. Either the
-// file is refused or the job reports once. Nothing leaks or hangs.
+// Runs jobs with a codec library that returns a wrong value in one call, or in one call and all
+// later ones. Either the file is refused or the job reports once. Nothing leaks or hangs.
 #include <sys/resource.h>
 
 #include <algorithm>
@@ -22,10 +22,10 @@ namespace {
 constexpr unsigned kMaxSeconds = 30;  // of one job
 constexpr long kMaxMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
-// Without TAVO_FAULTS only kCalls calls to each function and every kStep-th wrong value are tried.
+// Number of calls tried per function; step between wrong values, 1 if TAVO_FAULTS is set.
 constexpr int kCalls = 2, kStep = 31;
 
-// Returns wrong values: some near the limits of the named value, and some for any value.
+// Returns wrong values: some near the limits of the named value, and some for every value.
 std::vector<int64_t> replacements_for(const std::string &value) {
     static std::map<std::string, std::vector<int64_t>> near_limits = {
         {"bytes", {16'384, 16'385, 131'071, 1'048'576, 1'048'577}},

@@ -90,7 +90,7 @@ const char *find_broken_promise(const outcome &found, int mode, const group &kin
     if (found.started != (no_job ? TAVO_ERR_MEMORY : 0)) return "code of tavo_analyze";
     if (no_job) return found.result.calls == 0 ? nullptr : "callback without a job";
     if (found.state != (found.result.status == 0 ? kStateFinished : kStateFailed)) return "state";
-    // A failure while opening must be reported there or have no effect.
+    // A failure in tavo_init must be reported there or have no effect.
     const job::result &a = found.result, &b = undisturbed.result;
     const bool same = a.status == b.status && a.hl_pos == b.hl_pos && a.beats == b.beats;
     if (!same && (kind.harmless || found.failed == found.failed_early)) return "result";
@@ -102,7 +102,7 @@ const char *find_broken_promise(const outcome &found, int mode, const group &kin
     return in_song ? job::find_inconsistency(a, mode) : "beats outside the song";
 }
 
-// Makes about `count` calls fail in turn, evenly spread, each alone and with all later ones.
+// Makes about `count` evenly spread calls fail in turn, each alone, then with all later ones.
 void try_calls(const std::string &path, int mode, const group &kind, int64_t count) {
     fault::plan plan = {kind.calls, INT64_MAX, false, kind.error};
     const outcome undisturbed = run(path, mode, plan);
@@ -147,14 +147,14 @@ TEST_P(Faults, JobReportsOnceOrIsRefused) {
     }
 }
 
-// Under the thread sanitizer the other formats are slow, and their jobs start no other threads.
+// ThreadSanitizer checks two formats. The others are slow and use the same threads.
 const auto kFormats =
     EVERY_CALL ? std::vector{"wav", "mp3", "m4a", "flac", "aac", "ogg"} : std::vector{"wav", "mp3"};
 INSTANTIATE_TEST_SUITE_P(Jobs, Faults,
                          testing::Combine(testing::ValuesIn(kFormats),
                                           testing::Values(kOpenedOnly, 0, 1, 2)));
 
-// All sources duplicate one descriptor and share its offset, so the song is decoded by one source.
+// The song is opened through a descriptor, which its sources duplicate.
 TEST(DuplicateFaults, AreReported) {
     const int input = dup(STDIN_FILENO);
     const int file = open(SHORT_SONGS "/brief.flac", O_RDONLY);

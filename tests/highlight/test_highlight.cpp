@@ -28,7 +28,7 @@ float plain_power(const int16_t *pcm, int64_t window) {
 
 using indexes = std::vector<int32_t>;
 
-constexpr int32_t kSlow = 100;  // Hz; the curve does not depend on the rate
+constexpr int32_t kSlow = 100;  // Hz; a low rate keeps the PCM short
 constexpr int32_t kRate = 8000;
 
 std::vector<float> expand(const std::string &pairs) {
@@ -78,7 +78,7 @@ indexes find_valleys(const indexes &dips, float depth = 0.0f, float mean = 0.5f,
     return out;
 }
 
-// Returns the tuned start. The PCM has 0.4 s per point and begins 3 s before the coarse start.
+// Returns the tuned start. The steps of 0.4 s begin 3 s before the coarse start.
 uint32_t tune(const std::string &steps, int32_t rate = kRate, uint32_t start_ms = 3000,
               uint32_t duration_s = 60) {
     std::vector<int16_t> pcm = make_pcm(steps, rate * 2 / 5);
@@ -119,7 +119,7 @@ TEST(PowerEnvelope, HasOneValueEveryTwoSeconds) {
     EXPECT_EQ(hl.power, nullptr);
 }
 
-// The curve is computed in two halves. If the number of windows is odd, they share one.
+// The curve is computed in two halves, which share a window if the number of windows is odd.
 TEST(PowerEnvelope, EqualsEachWindowSummedSeparately) {
     std::mt19937 random(11);
     for (int64_t windows = 1; windows <= 9; ++windows) {
@@ -137,8 +137,8 @@ TEST(PowerEnvelope, EqualsEachWindowSummedSeparately) {
     }
 }
 
-// Points count as low if they are a deviation below the mean, or 1.5 deviations if the mean exceeds
-// 0.5. A valley is the last point of a low stretch.
+// A point is low if it is more than one standard deviation below the mean (1.5 if the mean exceeds
+// 0.5). A valley is the last point of a low stretch.
 TEST(Valleys, AreTheEndsOfQuietStretches) {
     EXPECT_EQ(find_valleys({5}, 0.375f, 0.75f, 0.25f), indexes{});
     EXPECT_EQ(find_valleys({5}, 0.34375f, 0.75f, 0.25f), indexes{5});
@@ -153,8 +153,8 @@ TEST(Valleys, AreTheEndsOfQuietStretches) {
     EXPECT_EQ(find_valleys(many), indexes(many.begin(), many.begin() + 15));
 }
 
-// Edges are steep rises. Those in the first 18 s and the last 50 s of a song do not count. In a
-// song of less than 90 s, only those in the last 20 s do not count.
+// Edges are steep rises. Those in the first 18 s and the last 50 s of a song are ignored. In a song
+// shorter than 90 s, those in the last 20 s are ignored.
 TEST(Search, ReturnsTheBestEdge) {
     const struct {
         const char *curve;
@@ -166,7 +166,7 @@ TEST(Search, ReturnsTheBestEdge) {
         {"3 0.1 1 1 11 0.1 6 0.45 7 0.1 1 0.35 12 0.65 19 0.1", 120, 56000},
         // Of two edges with equal scores the larger step wins.
         {"3 0.125 1 1 9 0.125 1 0.375 7 0.8125 10 0.25 10 0.75 19 0.25", 120, 60000},
-        // An edge is not scored if the average falls there. If no edge is scored, the first counts.
+        // An edge where the average falls is not scored. If no edge is scored, the first one wins.
         {"5 0.25 10 1 1 0.6 1 0.9 20 0.6 23 0.25", 120, 32000},
         {"5 0.25 10 1 1 0.5 1 0.875 20 0.625 23 0.25", 120, 30000},
         // An edge is scored if four loud points follow it. Loud points are above the mean.
@@ -175,16 +175,16 @@ TEST(Search, ReturnsTheBestEdge) {
         // An edge near the start counts only in a short song.
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 90, 60000},
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 89, 8000},
-        // The only edge is inside a passage, so the answer is the edge itself.
+        // The only edge is inside a passage, so the result is the edge itself.
         {"6 0.75 24 1 11 0.25 1 0.5 1 0.75 8 0.875 9 0.25", 80, 10000},
-        // The first row has the latest edge that counts. In the second one the edge is too late,
-        // and in the third one an earlier edge is chosen.
+        // The edge of the first row is as late as possible. That of the second row is too late. In
+        // the third row an earlier edge is chosen.
         {"36 0.25 10 1 14 0.25", 90, 70000},
         {"37 0.25 10 1 13 0.25", 90, 74000},
         {"20 0.25 1 0.9 14 0.25 1 1 24 0.25", 90, 40000},
         {"51 0.25 5 1 4 0.25", 89, 100000},
         {"52 0.25 5 1 3 0.25", 89, 104000},
-        // No edge is scored, so the answer is the first edge that no valley follows closely.
+        // No edge is scored, so the result is the first edge without a valley soon after it.
         {"20 0.5 1 1 1 0.9 1 0.3 1 0.1 1 0.4 5 0.5 2 0.85 28 0.5", 120, 60000},
         {"20 0.5 1 1 1 0.9 1 0.5 1 0.3 1 0.1 1 0.4 4 0.5 2 0.85 28 0.5", 120, 40000},
         // An edge must rise above the 60th percentile, not only to it.
@@ -198,8 +198,8 @@ TEST(Search, ReturnsTheBestEdge) {
     for (const auto &c : cases) EXPECT_EQ(search(c.curve, c.duration_s), c.ms) << c.curve;
 }
 
-// Only the ten largest edges count. The passage after nine bursts is found, but not after ten. Of
-// thirty passages the loudest, which is the last, is found.
+// Only the ten largest edges are compared, so a passage after nine bursts is found, but one after
+// ten is not. Of thirty passages, the last one is found, because it is the loudest.
 TEST(Search, ComparesTenEdgesAndThirtyPassages) {
     std::string bursts = "12 0.25", passages;
     for (int k = 0; k < 9; ++k) bursts += " 1 0." + std::to_string(99 - k) + " 4 0.25";
@@ -224,7 +224,7 @@ TEST(Search, RequestedLengthMovesTheStart) {
         uint32_t ms;
     } cases[] = {
         {plain, 0, 58000},        {plain, 44, 58000},  // not long enough to move the start
-        {plain, 46, 58000},                            // the nearest boundary is the same
+        {plain, 46, 58000},                            // the start is still the nearest boundary
         {plain, 60, 26000},   // the nearest boundary is the end of the first passage
         {plain, 102, 18000},  // as long as the song after the first passage
         {plain, 104, 18000},      {valley_first, 80, 40000}, {segment_first, 102, 18000},
@@ -297,13 +297,13 @@ TEST(Tune, StartNearTheEndsOfTheSongIsReturnedUnchanged) {
     for (const uint32_t start : {0u, 2000u, 51001u, 52000u, 70000u}) {
         EXPECT_EQ(_tune_HL_simple(nullptr, kRate, start, 60), start);
     }
-    for (const int32_t rate : {-8000, 0, 2}) {  // 2: the hop has no sample
+    for (const int32_t rate : {-8000, 0, 2}) {  // at 2 Hz a hop has no sample
         EXPECT_EQ(_tune_HL_simple(nullptr, rate, 20000, 60), 20000u) << rate;
     }
 }
 
-// The start moves to the largest rise, where the average of five windows exceeds the window before
-// them by more than 0.13 dB, and from there to the smallest change between windows.
+// A rise is the excess of the average of five windows over the window before them. The start moves
+// to the largest rise above 0.13 dB and from there to the smallest change between two windows.
 TEST(Tune, MovesToTheSharpestRise) {
     // Of the five steps after the largest rise only the fourth is a fall.
     const char *song = "13 0 1 .6 1 .3 1 0 1 .3 1 .6 12 0";
@@ -320,13 +320,12 @@ TEST(Tune, MovesToTheSharpestRise) {
     EXPECT_EQ(tune("6 0 5 .5 7 0 5 .5 7 0"), 2400u);  // the first of two equal rises
 }
 
-// Tuning moves the coarse start to the first window that is completely loud. It needs enough PCM
-// for all its windows.
+// Tuning moves the coarse start to the first window that is completely loud, unless the PCM ends
+// too early, as in the third song.
 TEST(Position, IsTheTunedStart) {
     EXPECT_EQ(find_position(make_pcm("60 .04 40 .64 20 .04", kRate), 120, 58), 60200u);
     EXPECT_EQ(find_position(make_pcm("1160 .04 20 .64 26 .04", kRate / 10), 200, 58), 116200u);
-    EXPECT_EQ(find_position(make_pcm("116 .04 2 .64 2 .04", kRate), 200, 58),
-              112000u);  // not tuned
+    EXPECT_EQ(find_position(make_pcm("116 .04 2 .64 2 .04", kRate), 200, 58), 112000u);
     EXPECT_EQ(find_position({}, 120, 0), 0u);
     EXPECT_EQ(find_position(make_pcm("47999 .5", 1), 5, 0), 0u);
     EXPECT_EQ(find_position(std::vector<int16_t>(120 * kRate), 120, 58), 0u);

@@ -35,7 +35,7 @@ public final class BridgeTest {
         }
     }
 
-    /** Records the event of an analysis. Inside the event it calls deinit, which must fail, and throws. */
+    /** Records the event of an analysis. Inside the event, deinit is called and fails, then an exception is thrown. */
     private static final class Recorder implements TavoListener {
         final CountDownLatch posted = new CountDownLatch(1);
         volatile String events = "";  // one result of deinit per event

@@ -33,11 +33,11 @@ std::atomic<int> misplaced_calls;  // number of calls made while an exception wa
 
 // The settings that a test makes, and the events that the machine recorded.
 struct {
-    // The n-th call to this function fails; 1 is the next call. As the interface specifies, it
-    // returns null with an exception pending, or it returns an error code.
+    // The nth call to this function fails; 1 is the next call. Depending on the function, it
+    // returns an error code, or null with an exception pending.
     std::string failing = {};
     int nth = 1;
-    // Each call to this function runs the action on the calling thread.
+    // Each call to this function runs the action.
     std::string watched = {};
     std::function<void()> action = {};
 

@@ -1,4 +1,4 @@
-// Defines a file for each format source, and a fixture that opens and reads them. The fake codec
+// Defines a file in each format, and a fixture that opens and reads such files. The fake codec
 // library determines what the decoders deliver.
 #ifndef TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
 #define TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
@@ -33,7 +33,7 @@ struct source_row {
     std::string config;           // the decoder's configuration for 5 channels at 22,050 Hz
     std::string reader, decoder;  // prefixes of their function names; empty if not used
     std::string opens;            // the calls that an open makes, in order
-    std::string codes;            // for each call, the result of the open if it fails; 0: no effect
+    std::string codes;            // for each call, the open's result if that call fails; 0: success
 };
 inline const std::string kAacConfig = bytes_of(xaac_config{{1, 2, 2, 0}, 3, 22050, 5, 0});
 inline const std::string kMpegConfig = bytes_of(wexa_config{1, 0, 2, 0});

@@ -90,8 +90,7 @@ void expect_type(int32_t type, const std::vector<std::string> &contents) {
 
 TEST(Recognise, FirstBytesDetermineTheType) {
     std::string long_tag = id3((1 << 21) + (3 << 14) + (2 << 7) + 5);
-    for (const size_t at : {6u, 8u})
-        long_tag[at] |= '\x80';  // the top bits of size bytes are ignored
+    for (const size_t at : {6u, 8u}) long_tag[at] |= '\x80';  // a size byte's top bit is ignored
     expect_type(2002, {kAsf});
     expect_type(2000, {"1234ftyp", "1234mdat", "1234moov"});
     expect_type(322, {"fLaC", long_tag + "fLaC"});
@@ -146,8 +145,8 @@ TEST(ProbeMpeg, FindsTwoHeadersOneFrameLengthApart) {
     }
 }
 
-// Neither free format nor Layers I and II of MPEG-2.5 have a known frame length, so they are only
-// accepted as a second header. The other headers have an invalid field or no sync word.
+// The first three headers have no known frame length (free format, Layers I and II of MPEG-2.5) and
+// are accepted only as a second header. The others have an invalid field or no sync word.
 TEST(ProbeMpeg, InvalidHeadersAreRejected) {
     const std::pair<const char *, int32_t> cases[] = {
         {"\xFF\xFB\x01", 305},  {"\xFF\xE5\x90", 304},  {"\xFF\xE7\x90", 303},
@@ -163,23 +162,23 @@ TEST(ProbeMpeg, ScanContinuesAfterARejectedCandidate) {
     // Two candidates overlap. The first, at 0, has no second header; the other, at 1, has one.
     const std::string overlap = put("\xFF\xFF\xE2\x10", 53, "\xFF\xE2\x10\0"s) + zeros(600);
     expect_type(305, {"\xFF\xFB\x90" + kLayer3Pair, overlap});
-    // A pair is only found if its second header starts in the first 32 KiB, less four bytes.
+    // A pair is found only if its second header starts more than four bytes before 32 KiB.
     const std::string late = put(zeros(kScanBytes), 32500, pair("\xFF\xFF\x10", 32));
     expect_type(305, {put(zeros(kScanBytes), 32763 - 417, kLayer3Pair)});
     expect_type(303, {late});
     expect_type(2199, {put(late, 32764 - 417, "\xFF\xFB\x90")});
-    // Headers inside a tag are skipped, but not those inside bytes that only resemble a tag.
+    // Headers inside a tag are skipped. Bytes that only resemble a tag are scanned.
     const std::string tag = put(id3(1000), 20, kLayer3Pair), long_tag = zeros(100) + id3(40000);
     const std::string tags = id3(3) + id3(0) + zeros(7) + id3(50);
     expect_type(305,
                 {long_tag + kLayer3Pair, tags + kLayer3Pair, put(tag, 3, "\1"), put(tag, 3, "\5")});
     expect_type(2199, {long_tag, id3(3) + tag + zeros(20), put(tag, 3, "\2"), put(tag, 3, "\4")});
-    for (const size_t inside : {4u, 6u, 9u, 10u}) {  // bytes of the tag inside the scan's buffer
+    for (const size_t inside : {4u, 6u, 9u, 10u}) {  // bytes of a tag in the scan's buffer
         const std::string before = zeros(kScanBytes - inside) + id3(700);
         expect_type(305, {before + kLayer3Pair});
         expect_type(2199, {before, zeros(kScanBytes - inside) + "ID3\3" + zeros(5)});
     }
-    // Ogg, program streams and transport streams (with a sync byte at 188) are not scanned.
+    // Ogg files, program streams and transport streams (sync byte at 188) are not scanned.
     const std::string sync = "\x47" + kLayer3Pair;
     expect_type(2199, {"OggS" + kLayer3Pair, "\0\0\1\xBA"s + kLayer3Pair});
     expect_type(2199, {put(sync, 188 - kBefore, "\x47"), "\x47"});

@@ -6,9 +6,9 @@ namespace {
 using result = std::pair<int32_t, samples>;
 using frames = std::vector<fake_codec::frame>;
 
-constexpr int32_t kAll = 900'000;  // bytes; more than any stream here, less than the queue's size
+constexpr int32_t kAll = 900'000;  // bytes; less than the queue's size
 
-// Returns a frame of one stereo pair, which is not the first frame of its stream.
+// Returns a frame of one stereo pair. Its start is not 0, so it is not the first of its stream.
 fake_codec::frame pair_frame(int16_t value, int32_t decode_result = 0, int32_t produced = 1) {
     return {{value, value}, 1000 + value, 0, decode_result, produced};
 }
@@ -72,12 +72,11 @@ TEST_F(Reading, FramesAreDecodedIntoTheQueue) {
     });
 }
 
-// One undecodable frame is skipped after a reset of the decoder. A second one, a failed read or an
-// impossible byte count makes the read fail. The next read delivers what the queue holds.
+// An undecodable frame resets the decoder and is skipped. A second one in a row, an unreadable
+// frame or an impossible byte count makes the read fail. The next read delivers the rest.
 TEST_F(Reading, OneUndecodableFrameIsSkipped) {
     for_each_row([&](const source_row &row) {
-        const int32_t too_many =
-            1'048'575 + (row.codec == 322 ? 131'070 : 0);  // exceeds the free bytes
+        const int32_t too_many = 1'048'575 + (row.codec == 322 ? 131'070 : 0);
         const struct {
             frames bad;  // between good frames with the samples 2 and 6
             int32_t code;
@@ -135,10 +134,7 @@ TEST_F(Reading, PcmIsReducedToOneChannel) {
         {"mpeg", 2, {{pcm, 1}}, {-1, 1, 32767, -32768, 0, 7}},  // the mean of both channels
         {"mpeg", 3, {{pcm, 1}}, {-1, 16383, -32768, -16380}},   // the mean of the first two
         {"mpeg", 2, {{late, 0}, {{8, 8}, 9}}, {7, 8}},
-        {"mpeg",
-         2,
-         {{samples(800, 1), 0}, {{8, 8}, 9}},
-         {8}},  // only the first frame is dropped, although it is shorter than the delay
+        {"mpeg", 2, {{samples(800, 1), 0}, {{8, 8}, 9}}, {8}},  // drops one frame at most
         {"mpeg", 2, {{late, 1}}, after_delay},
         {"mpeg", 2, {{late, 0}}, after_delay, 48000},
         {"mpeg", 1, {{late, 0}}, late},
@@ -150,7 +146,6 @@ TEST_F(Reading, PcmIsReducedToOneChannel) {
     }
 }
 
-// Blocks of the largest size, 65,535 sample pairs, do not overflow the queue.
 TEST_F(Reading, LargestFlacBlockFitsTheQueue) {
     samples block, expected;
     for (size_t i = 0; i < 131'070; ++i) block.push_back(static_cast<int16_t>(i / 2));
@@ -162,7 +157,7 @@ TEST_F(Reading, LargestFlacBlockFitsTheQueue) {
     EXPECT_TRUE(got == result(0, expected) && rest.first == 1);
 }
 
-// The stream has 160 frames of 16,384 bytes, in which every sample is the frame's number.
+// The stream has 160 frames of 16,384 bytes. Every sample of a frame is the frame's number.
 TEST_F(Reading, RequestsOfAnySizeAreDelivered) {
     frames numbered;
     for (int16_t i = 0; i < 160; ++i) {  // the frames fill their buffer
@@ -175,13 +170,13 @@ TEST_F(Reading, RequestsOfAnySizeAreDelivered) {
     EXPECT_EQ(read(-1).first, -4);
     EXPECT_EQ(mtsrc_getstream(src, 10, &no_data), -4);
     EXPECT_EQ(mtsrc_getstream(src, 10, nullptr), -4);
-    // If only one more frame fits, the queue first moves its bytes to its start.
+    // If there is space for only one more frame, the queue first moves its bytes to the start.
     for (int16_t i = 0; i < 63; ++i) EXPECT_EQ(read(16'384), result(0, samples(8192, i)));
     expect_queue(1'032'192, 1'032'192);
     EXPECT_EQ(read(2), result(0, {63}));
     expect_queue(2, 16'384);
     EXPECT_EQ(read(16'382), result(0, samples(8191, 63)));
-    // A request for almost the whole queue fails, but the frames that were read stay in the queue.
+    // A request for almost the whole queue fails, but the queue keeps the frames read so far.
     EXPECT_EQ(read(1'048'575), result(-4, {}));
     expect_queue(0, 1'032'192);
     for (int16_t i = 64; i < 160; ++i) EXPECT_EQ(read(16'384), result(0, samples(8192, i)));
@@ -218,7 +213,7 @@ TEST_F(Reading, SeekAndResetEmptyTheQueue) {
         expect_queue(0, 0);
         EXPECT_EQ(read(1), result(1, {}));
     });
-    // An MP4 source with another codec has no decoder, so it delivers only what the queue holds.
+    // An MP4 source with an unknown codec decodes nothing and delivers only what is in the queue.
     open_frames(row_of("mp4 with aac"), {pair_frame(2), pair_frame(4)});
     EXPECT_EQ(read(1).first, 0);
     src->codec = 307;

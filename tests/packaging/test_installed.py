@@ -1,4 +1,4 @@
-"""Tests what is installed. Programs are built with its CMake package and with pkg-config."""
+"""Tests the installed files. Programs are built with the CMake package and with pkg-config."""
 import array
 import json
 import os
@@ -118,7 +118,7 @@ class Installed(unittest.TestCase):
                 self.assertIn("endbr64", run("objdump", "-d", path), path)
 
     def test_interface_only_grows(self):
-        """Compares the interface with packaging/tavo.abi. After a release with new functions, UPDATE_ABI=1 rewrites it."""
+        """Compares the interface with packaging/tavo.abi. UPDATE_ABI=1 rewrites that file for new functions."""
         kept = ROOT / "packaging/tavo.abi"
         names = ROOT.joinpath("packaging/exports.txt").read_text().split("# version TAVO_1:")[1].split("# version")[0]
         sources = [*ROOT.glob("core/*.cpp"), ROOT / "media_source/mtsrc.cpp", ROOT / "beat/click_track.cpp"]

@@ -50,7 +50,7 @@ class ManPageAndCompletions(unittest.TestCase):
         self.assertEqual(named, set(complete("-")))
 
     def test_choices(self):
-        """The values offered for an option are those that it accepts."""
+        """Completions offer exactly the values that an option accepts."""
         for option in ("--mode", "--format", "--fps"):
             refused = subprocess.run([TAVO, option, "?", "x"], capture_output=True, text=True)
             choices = sorted(re.search(r"{(.*)}", refused.stderr)[1].split(","))

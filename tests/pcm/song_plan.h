@@ -1,5 +1,5 @@
-// A fixture with an instance whose decoding is planned. The fake codec library describes the
-// stream, and each test supplies its bytes.
+// A fixture with an instance that is ready to decode. The fake codec library describes the stream,
+// and each test supplies the stream's bytes.
 #ifndef TAVO_TESTS_PCM_SONG_PLAN_H
 #define TAVO_TESTS_PCM_SONG_PLAN_H
 
@@ -38,15 +38,15 @@ inline signal_run convert_pcm(const void *pcm, size_t bytes, int32_t rate) {
     return read_output(out, n);
 }
 
-// Replaces the functions of a source after planning: delivers a stream and records the requests.
+// Replaces a source's read and seek functions: delivers a stream and records the requests.
 struct fake_source {
     std::string stream = {};
     int64_t at = 0;               // offset of the next byte
     int64_t fail_at = INT64_MAX;  // reads that end after this offset fail
-    int empty_replies = 0;        // number of reads that deliver nothing before the others
+    int empty_replies = 0;        // number of reads at the start that deliver nothing
     int32_t code = 0;             // result of a read before the end of the stream
     int64_t seek_target = -1;     // byte that the next seek reaches; -1: the requested one
-    int64_t seek_report = -1;     // position that it reports, 100-ns units; -1: the requested one
+    int64_t seek_report = -1;     // position that the seek reports, 100 ns; -1: the requested one
     bool seek_fails = false;      // the next seek fails and reports nothing
     std::vector<int64_t> seeks = {};
     int32_t max_request = 0;
@@ -93,7 +93,7 @@ class song_plan : public testing::Test {
         EXPECT_TRUE(fake_codec::state.objects.empty());
         EXPECT_TRUE(fake_codec::state.misuses.empty());
     }
-    // Plans the decoding and returns the code. Sources deliver `stream` from their segments on.
+    // Plans the decoding and returns the code. Each source delivers `stream` from its segment on.
     int32_t plan(int64_t duration, int32_t rate, const std::string &stream = {}) {
         release();
         std::ofstream(file.path) << head;

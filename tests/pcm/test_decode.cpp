@@ -22,7 +22,7 @@ TEST_F(DecodePlan, RefusesShortStreamsAndSegmentsTheOthers) {
         {200'000'000, 100'000'000, 8000, 0, 4, 160'000},
         {200'000'000, 149'999'999, 8000, 0, 4, 80'000},  // just over 5 s are left
         {200'000'000, 150'000'000, 8000, 0, 1, 80'000},
-        {50'000'000, -10'000'000, 8000, 0, 1, 96'000},     // more than 5 s, but one record
+        {50'000'000, -10'000'000, 8000, 0, 1, 96'000},     // more than 5 s, but only one record
         {200'000'000, 200'000'000, 8000, -2, 1, 0},        // nothing is left
         {200'000'000, 199'999'999, 8000, -2, 1, 0},        // less than one byte is left
         {200'000'000, 200'000'001, 8000, -2, 0, 320'000},  // starts after the end
@@ -36,8 +36,7 @@ TEST_F(DecodePlan, RefusesShortStreamsAndSegmentsTheOthers) {
         const int32_t records = ctx.seg_count;
         const bool again = each.start != kSetup;
         const int64_t start = again ? each.start : 0;
-        EXPECT_EQ(fake_codec::state.objects.size(),
-                  static_cast<size_t>(records));  // one source per record
+        EXPECT_EQ(fake_codec::state.objects.size(), static_cast<size_t>(records));
         if (again) {
             for (int32_t i = 0; i < records; ++i) free(ctx.seg[i].buf);
             free(ctx.pcm);
@@ -82,7 +81,7 @@ TEST_F(DecodePlan, ClosesEverySource) {
         std::deque<int32_t> &results = fake_codec::state.results["xflac_init"];
         results.assign(good, 0);
         results.push_back(1);
-        // If the first open fails, the plan fails with -4, otherwise with the code of the open.
+        // The code is -4 if the first source cannot be opened, for later ones that of the open.
         EXPECT_EQ(plan(kTenSeconds, kRate), good == 0 ? -4 : -255) << good;
         EXPECT_TRUE(ctx.seg == nullptr && fake_codec::state.objects.empty());
     }
@@ -107,8 +106,8 @@ class Decode : public song_plan {
     std::string stream = noise(160'000, 1);
 };
 
-// The last segment starts at byte 120,000. A stream that ends in its first second, which is
-// skipped, has no output.
+// The last segment starts at byte 120,000, and its first second is skipped. A stream that ends
+// before the end of that second has no output.
 TEST_F(Decode, OutputEqualsTheStream) {
     for (const int64_t end : {160'000, 159'999, 136'200, 136'000, 120'000, 100'000}) {
         const int64_t want = end > 136'000 ? end : 0;

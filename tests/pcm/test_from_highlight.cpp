@@ -9,7 +9,7 @@ namespace {
 constexpr int32_t kRate = 8000;
 constexpr int64_t kBytes = 320'000;         // 20 s
 constexpr int64_t kDuration = 200'000'000;  // units
-constexpr int64_t kBlock = 4608;            // offset of the compared block after a seek, bytes
+constexpr int64_t kBlock = 4608;            // bytes from a seek position to the compared block
 
 using positions = std::vector<int64_t>;
 
@@ -22,7 +22,7 @@ class FromHighlight : public song_plan {
         ctx.ana_rate = kAnalysisRate;
         ASSERT_EQ(DecodePcmMT(&ctx, ctx.pcm, ctx.pcm_bytes), kBytes);
     }
-    // Expects that a highlight at `pos` is reported at `hl_pos` and that `bytes` follow it.
+    // Expects a highlight at `pos` to be reported at `hl_pos` and `bytes` to become the signal.
     void expect_from(int64_t pos, const std::string &bytes, uint32_t hl_pos) {
         EXPECT_EQ(tavo_get_from_here(&ctx, pos), 0);
         EXPECT_EQ(ctx.pcm, nullptr);
@@ -53,13 +53,13 @@ TEST_F(FromHighlight, FirstSecondIsTheStartOfTheFile) {
 }
 
 TEST_F(FromHighlight, SeekPositionIsFoundInThePcm) {
-    // After a seek to 2500 ms, byte 40,000, the decoded block is searched for in bytes 24,000 to
-    // 87,999 of the PCM. If it is not found there, the rest of the song is decoded again.
+    // After a seek to 2500 ms (byte 40,000), a decoded block is searched for in bytes 24,000 to
+    // 87,999 of the PCM. If it is not there, the rest of the song is decoded again.
     const struct {
         const char *name;
         uint32_t ms;             // position that the seek reports
         int64_t reached;         // byte that the seek reaches
-        positions copies;        // bytes to which the probe's block is copied
+        positions copies;        // offsets to which the block is copied
         int64_t start;           // first byte of the signal
         bool found = true;       // false: the rest is decoded again
         int64_t bytes = kBytes;  // of the PCM
@@ -106,8 +106,8 @@ TEST_F(FromHighlight, SecondDecodingReleasesTheFirst) {
     EXPECT_EQ(hl.hl_pos, 20'000U);
 }
 
-// The record is a heap block of its own, so that a sanitizer detects a read of another record. The
-// audio is searched for only in the bytes that the record's duration covers.
+// The record is a heap block of its own, so that a sanitizer detects a read past its end. The
+// search covers only the bytes within the record's duration.
 TEST_F(FromHighlight, ComparisonReadsOnlyItsRecord) {
     ASSERT_EQ(plan(kDuration, kRate, stream), 0);
     const auto seg = std::make_unique<TAVO_DECSEG>();

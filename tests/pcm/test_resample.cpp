@@ -42,7 +42,7 @@ TEST(ResampleBlock, AveragesBlocks) {
     // An empty block, here every other one, uses the sample at its start.
     EXPECT_EQ(average(1, 2, 0, 5, in), (signal_run{10, 10, 20, 20, 30}));
     EXPECT_EQ(average(1, 1, 0, 1, {}), signal_run{-1});
-    // Block positions have single precision, so they are even numbers above 2^24.
+    // Above 2^24, block positions are even numbers, because they have single precision.
     constexpr int64_t kEven = 16'777'216;
     const sample_run ramp = {2, 1, 2, 3, 4, 5, 6, 7};
     EXPECT_EQ(average(1, 1, kEven, kEven + 4, ramp, kEven), (signal_run{2, 1.5, 2.5, 4}));
@@ -50,7 +50,7 @@ TEST(ResampleBlock, AveragesBlocks) {
               (signal_run{1.66666662693023681640625, 3.5, 6}));
 }
 
-// The expected values come from a separate computation. The last bit of the sine may differ.
+// The expected values were computed separately. The tolerance is for the last bit of the sine.
 TEST(ResampleSinc, TableHoldsTheWindowedSinc) {
     for (const auto &[rate, phase, tap, want] : {std::tuple{48000, 0, 9, 0.20671874284744263},
                                                  {48000, 240, 0, -5.7826164265861735e-6},
@@ -88,7 +88,7 @@ sample_run filter(const state_ptr &state, const sample_run &in) {
     return out;
 }
 
-// No real filter produces these sums. fuzz/stages.cpp tests real filters, both ends and channels.
+// No real filter produces these sums. fuzz/stages.cpp tests real filters.
 TEST(ResampleSinc, RoundsAndWrapsSums) {
     const auto filter_constant = [](int16_t sample, float a, float b, float c) {
         return slice(filter(three_taps(a, b, c), sample_run(20, sample)), 1, 18);
@@ -120,7 +120,7 @@ TEST(ResampleSinc, RefusesBadArgumentsAndPhases) {
     drifting->ratio = 1.125f;
     EXPECT_EQ(slice(filter(drifting, in), 2, 6), (sample_run{0, 0, 5, 77}));
     EXPECT_EQ(filter(drifting, in).back(), -1);
-    // Single precision rounds the last position to one past the input, which ends the conversion.
+    // Single precision rounds the last position past the end, which ends the conversion early.
     constexpr int32_t kLong = (1 << 27) + 12;
     auto *silence = static_cast<int16_t *>(calloc(kLong, sizeof(int16_t)));
     drifting->taps = 20;

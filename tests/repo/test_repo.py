@@ -1,5 +1,5 @@
-"""Checks that folders include only folders below them, and that the library exports and imports only the intended
-names. Each check is also shown to fail. Arguments: the repository, the library."""
+"""Checks that a folder includes only the headers of folders below it, and that the library exports and imports only
+the intended names. Also makes each check fail once. Arguments: the repository, the library."""
 import pathlib
 import re
 import subprocess
@@ -56,8 +56,8 @@ def run(*command):
 
 
 def find_differences(library, names):
-    """Returns names that are only in the library or only in the list, and needed libraries that are not in NEEDED. Also
-    returns TLS for thread-local storage, whose first use allocates memory, which may fail."""
+    """Returns names that are only in the library or only in the list, and needed libraries that are not in NEEDED. Adds
+    TLS if there is thread-local storage, because its first use allocates memory, which may fail."""
     symbols = run("nm", "-D", "--defined-only", library).splitlines()
     exported = [line.split()[-1].split("@")[0] for line in symbols if line.split()[1] != "A"]  # A: a symbol version
     needed = re.findall(r"\(NEEDED\).*\[(.*)\]", run("readelf", "-d", library))
@@ -98,7 +98,7 @@ class Repository(unittest.TestCase):
         self.assertEqual(len(names), len(set(names)))
         self.assertEqual(find_differences(LIBRARY, names), set())
         self.assertEqual(find_differences(LIBRARY, {"tavo_other", *names} - {"tavo_init"}), {"tavo_other", "tavo_init"})
-        # The C library has thread-local storage, and a module of the desktop codec library needs libavcodec.
+        # These must be refused: libc has thread-local storage, and libwexaaudio_av.so needs libavcodec.
         libc = re.search(r"\S+/libc\.so\S*", pathlib.Path("/proc/self/maps").read_text())[0]
         self.assertIn("TLS", find_differences(libc, []))
         self.assertIn("libav", " ".join(find_differences(LIBRARY.parent / "libwexaaudio_av.so", [])))

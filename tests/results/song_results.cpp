@@ -1,6 +1,6 @@
 // song_results SONGS [EXPECTED]: analyses every file in the directory SONGS in several ways and
-// prints the results as JSON. If EXPECTED, the output of another run, is given, it prints only the
-// differences. The exit status is 1 if there is a difference or no song, and 2 for wrong usage.
+// prints the results as JSON. With EXPECTED, the output of another run, only the differences are
+// printed. The exit status is 1 if there is a difference or no song, and 2 for wrong usage.
 #include <filesystem>
 #include <fstream>
 #include <iostream>

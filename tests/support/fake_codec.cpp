@@ -9,11 +9,11 @@ namespace fake_codec {
 namespace {
 
 constexpr size_t kMaxCalls = 1000;
-constexpr int kMaxReadsAfterEnd = 1000;  // then reads fail, if `replace` hides the stream's end
+constexpr int kMaxReadsAfterEnd = 1000;  // later reads fail if `replace` is set
 
 std::mutex mutex;
 
-// The bytes that stand for a compressed frame. They point to the frame.
+// The bytes that a reader delivers as a compressed frame.
 struct compressed_frame {
     char magic[8] = "FCFRAME";
     const frame *original = nullptr;
@@ -25,7 +25,7 @@ void record_argument(const record *argument) {
     state.calls.back().records.push_back(argument ? bytes_of(*argument) : "");
 }
 
-// Records a call and its arguments. The caller keeps the returned lock until it returns.
+// Records a call and its arguments. The caller holds the returned lock for the rest of the call.
 template <typename... record>
 std::unique_lock<std::mutex> record_call(const char *name, const record *...arguments) {
     std::unique_lock<std::mutex> lock(mutex);
@@ -63,7 +63,7 @@ std::string kind_of_call() {
     return name.substr(0, name.find('_'));
 }
 
-// Returns the object of a handle. If there is none of that kind, records a misuse.
+// Returns the object of a handle. If it does not exist, records a misuse and returns null.
 object *find_object(const void *handle, const std::string &kind = kind_of_call()) {
     for (object &each : state.objects) {
         if (&each == handle && each.kind == kind) return &each;
@@ -148,7 +148,7 @@ int32_t decode(const void *handle, const wexa_frame *input, wexa_output *output,
         memcpy(&compressed, bytes, sizeof compressed);
     }
     status->produced = 0;
-    // Other bytes are the set-up data, which produces no output, or an incomplete frame.
+    // Other bytes are an incomplete frame or, without an output buffer, the set-up data.
     if (strncmp(compressed.magic, compressed_frame().magic, 8) != 0) {
         return next_result(output->data ? -1 : 0);
     }
@@ -347,7 +347,7 @@ int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
     const std::string &setup = state.streams.back().setup;
     int32_t reported =
         state.streams.back().setup_length.value_or(static_cast<int32_t>(setup.size()));
-    if (buf) {  // *length is its size
+    if (buf) {  // *length is the buffer's size
         reported = std::clamp(*length, 0, static_cast<int32_t>(setup.size()));
         memcpy(buf, setup.data(), static_cast<size_t>(reported));
     }

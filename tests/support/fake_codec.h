@@ -25,7 +25,7 @@ struct frame {
     int64_t start = 0;              // start time, 100-ns units
     int32_t read_result = 0;        // 0 for a frame, 1 for the end, otherwise a failure
     int32_t decode_result = 0;
-    int32_t produced = 1;                    // the decoder's status
+    int32_t produced = 1;                    // the number that the decoder reports in its status
     std::optional<int32_t> bytes = {};       // false size of the samples, reported by the decoder
     std::optional<int32_t> read_bytes = {};  // false size of the frame, reported by the reader
 };
@@ -64,13 +64,12 @@ struct call {
 //   "result": result of any function. An object is only created if it is 0.
 //   "bytes", "first": size and start time of a frame; "reached": position reached by a seek
 //   "produced", "bytes": the decoder's status and the size of its output
-//   "rate", "channels", "bits", "codec", "duration", "count", "kind", "length": properties of a
-//   file
+//   "rate", "channels", "bits", "codec", "duration", "count", "kind", "length": of the file
 // The library holds its lock during the call.
 using replacement = int64_t (*)(const std::string &function, const std::string &value,
                                 int64_t original);
 
-// The object of a handle. `reserved` comes first, because the FLAC source sets a flag there.
+// The object of a handle. The FLAC source sets a flag in `reserved`, which must be the first field.
 struct object {
     uint8_t reserved[4096] = {};
     std::string kind = {};  // for example "xaacfd", created by xaacfd_create

@@ -1,6 +1,5 @@
-// Makes calls to memory, thread, lock and file functions fail, on any thread. Only calls from
-// objects that are linked into the program are affected, so the program links the library's
-// objects.
+// Makes calls to memory, thread, lock and file functions fail, on any thread. The program must link
+// the library's objects, because calls in libtavo.so do not fail.
 #ifndef TAVO_TESTS_SUPPORT_FAULT_LAYER_H
 #define TAVO_TESTS_SUPPORT_FAULT_LAYER_H
 

@@ -7,7 +7,7 @@ set -eu
 make_song=$1
 out=$2
 exec 9>"$out.lock"
-flock 9 # tests of another build may run
+flock 9 # another build may make the same songs
 here=$(dirname "$0")
 if [ -e "$out/.complete" ] && [ -z "$(find "$0" "$here"/*song*.cpp -newer "$out/.complete")" ]; then
   exit 0
@@ -56,7 +56,7 @@ convert six.wav six.aac -c:a aac -b:a 384k -aac_pns 0
 convert song48.wav loud.aac -c:a aac -b:a 320k -aac_pns 0 -af volume=12dB # exceeds full scale
 convert mono.wav core.aac -c:a aac -b:a 32k -ar 22050
 
-# These MP4 files hold the same frames in different layouts.
+# MP4 files of different layouts. Most of them contain the frames of low.aac.
 convert low.aac last.m4a -c:a copy -bsf:a aac_adtstoasc
 convert low.aac first.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart
 convert high.aac high.m4a -c:a copy -bsf:a aac_adtstoasc -movflags +faststart

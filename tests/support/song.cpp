@@ -17,13 +17,13 @@ constexpr double kQuietGain = 0.2;  // outside the loud section
 constexpr double kChordBeats = 16.0;
 constexpr double kOtherChannels = 0.8;  // level of the bed relative to the first channel
 constexpr double kFloor = 0.0008;       // level of the noise floor, which avoids digital silence
-// The loud section starts with an accent of the bed and then swells. Without that, a loudness curve
-// of overlapping windows would have several equally steep steps near the entry.
+// The loud section starts with an accent of the bed and then swells. Otherwise a loudness curve of
+// overlapping windows would have several equally steep steps near its start.
 constexpr double kAccentSeconds = 0.3;
 constexpr double kAccent = 1.35;
 constexpr double kSwellSeconds = 4.0;
 constexpr double kSwell = 0.15;
-constexpr double kFadeSeconds = 0.01;  // the bed's gain changes over this time, without a click
+constexpr double kFadeSeconds = 0.01;  // duration of each change of the bed's gain
 // Each chord consists of the second, third and fourth harmonic of its root, so the bed's spectrum
 // does not change.
 constexpr double kRootHz[4] = {110.0, 123.47, 98.0, 130.81};

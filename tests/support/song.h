@@ -9,16 +9,16 @@
 
 namespace support {
 
-// A song with a quiet opening, a loud section that starts at loud_at and a quiet tail that starts
-// at tail_at. The first drum hit is at half a second, and one follows on each beat.
+// A song of chords (the bed) and drum hits. It is quiet until loud_at, then loud until tail_at,
+// then quiet again. The first hit is at half a second, and one follows on each beat.
 struct song_spec {
     int32_t rate = 44100;  // Hz
     int32_t channels = 2;  // the first one is the loudest
     double seconds = 60.0;
     double bpm = 120.0;
     uint32_t seed = 1;         // varies the strength of the hits, the noise and the bed
-    double loud_at = 20.0;     // seconds; the song is loud from the start if it is 0 or less
-    double tail_at = 50.0;     // seconds; there is no tail if it is past the end
+    double loud_at = 20.0;     // seconds; if 0 or less, there is no quiet opening
+    double tail_at = 50.0;     // seconds; if past the end, there is no quiet tail
     double drum_level = 0.30;  // in the loud section, relative to full scale
     double bed_level = 0.40;   // in the loud section, relative to full scale
 };
