@@ -68,7 +68,7 @@ TEST(Candidates, LargerPeaksComeFirst) {
 }
 
 // At 40 BPM, the threshold's window is one frame longer than this song, so it is cut. The threshold
-// of the peak near the end is between 5.6 and 5.7.
+// at frame 200 is between 5.6 and 5.7.
 TEST(Candidates, WindowThatNearlyFitsIsCut) {
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.6}}, {}, 0, 8}), frames{});
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
