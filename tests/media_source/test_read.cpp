@@ -73,8 +73,7 @@ TEST_F(Reading, FramesAreDecodedIntoTheQueue) {
 }
 
 // A frame that cannot be decoded is skipped, and the decoder is reset. A second one in a row, an
-// unreadable frame or an impossible byte count makes the read fail. The next read delivers the
-// rest.
+// unreadable one or an impossible byte count makes the read fail. The next read delivers the rest.
 TEST_F(Reading, OneUndecodableFrameIsSkipped) {
     for_each_row([&](const source_row &row) {
         const int32_t too_many = 1'048'575 + (row.codec == 322 ? 131'070 : 0);
