@@ -1,8 +1,8 @@
 // Records that several folders share: the instance, TAVO_CTX, and its parts.
 //
-// The instance owns everything that its pointers lead to, except the callback. Decoding counts time
-// in 100-ns units (10,000,000 per second); results are in milliseconds. core/instance.h creates and
-// releases instances.
+// The instance owns everything reachable through its pointers, except the callback. Decoding counts
+// time in 100-ns units (10,000,000 per second); results are in milliseconds. core/instance.h
+// creates and releases instances.
 #ifndef TAVO_COMMON_TAVO_CTX_H
 #define TAVO_COMMON_TAVO_CTX_H
 

@@ -92,7 +92,7 @@ failure check_side_files(const request &message, const options &opts) {
     return failed;
 }
 
-// `row` receives the song's row of the report's index if a report is requested.
+// `row` receives the song's index row if a report is requested.
 failure write_side_files(record &result, const options &opts, uint64_t index, int stop_fd,
                          const song_file &song, std::string &row) {
     failure failed;

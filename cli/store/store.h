@@ -1,5 +1,5 @@
-// Results in a database: --store. Several commands may share one store. Without --store every
-// function does nothing.
+// Results in a database: --store. Several commands may share one store. Without --store these
+// functions do nothing.
 //
 // Input: results as JSON (write/json.h). Output: one row for each song and set of parameters. A
 // batch of rows is one transaction, so a kill at any moment loses at most the open batch and leaves

@@ -9,7 +9,7 @@
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
-// A frame rate of video and its form of timecode.
+// A video frame rate and its timecode format.
 struct frame_rate {
     const char *name;  // as in --fps
     int32_t frames;    // the rate is frames / seconds

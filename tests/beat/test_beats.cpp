@@ -44,7 +44,7 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 }  // namespace
 
-// A single requested beat is where quiet noise becomes loud, although later onsets are sharper.
+// With max_beats 1, the beat is where quiet noise becomes loud, although later onsets are sharper.
 TEST(Beats, PowerRiseForcesABeat) {
     std::mt19937 random(9);
     std::vector<double> song(90 * 11025);

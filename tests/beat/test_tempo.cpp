@@ -45,7 +45,7 @@ TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
         // A tempo wins over half that tempo unless the slower one correlates much more.
         {{{20, 1}, {40, 1.30}}, 129},
         {{{20, 1}, {40, 1.33}}, 64},
-        // These are the longest lags.
+        // The longest lags that are scored: 42 with twice the lag, 27 with three times the lag.
         {{{42, 1}, {27, 0.475}}, 61},
         {{{27, 1}, {81, 5.6}}, 31},
     };
