@@ -34,7 +34,7 @@ value_rank next_largest(const int32_t *candidates, int32_t count, const double *
 }
 
 // Writes the `maxn` strongest candidates, strongest first. If several are equally strong, the first
-// of them is written as often as there are such candidates.
+// is written once for each of them.
 int32_t write_strongest(const int32_t *candidates, int32_t count, int32_t maxn, const double *env,
                         int32_t *dst) {
     int32_t written = 0;

@@ -14,8 +14,8 @@ namespace {
 constexpr int64_t kFirstSeekMs = 1001;  // any earlier highlight counts as the start of the file
 constexpr float kMsPerSecond = 1000.0f;
 
-// The probe is PCM decoded from the seek position. The block to search for starts so late in the
-// probe that the decoder has settled after the seek.
+// The probe is PCM decoded from the seek position. The block to search for starts far enough into
+// the probe for the decoder to have settled after the seek.
 constexpr int64_t kProbeBytes = 8192;
 constexpr int64_t kProbeBlockOffset = 4608;
 

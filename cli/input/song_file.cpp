@@ -144,8 +144,8 @@ failure store_sound(decoding &sound, std::string_view part) {
 }
 
 // Decodes the first audio stream of a file to a 16-bit mono WAV file in memory. Reads source_fd or,
-// if that is negative, `path`. Keeps the sample rate, or uses the nearest supported one. Times are
-// those of a player.
+// if that is negative, `path`. Keeps the sample rate, or uses the nearest supported one. All times
+// are player times.
 failure decode(const std::string &path, const options &opts, int stop_fd, int source_fd,
                const std::string &filter, song_file &song) {
     decoding sound;

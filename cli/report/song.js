@@ -1,4 +1,4 @@
-// Draws a song's result on a time axis, in ms of the player's time, and plays the song.
+// Draws a song's result on a time axis, in player time (ms), and plays the song.
 const song = JSON.parse(document.getElementById("data").textContent);
 const beats = song.beats_ms || [];
 const hasHighlight = song.hl_pos_ms !== undefined;

@@ -15,7 +15,7 @@
 
 namespace {
 
-constexpr size_t kMostAhead = 10'000;   // inputs that wait for a worker
+constexpr size_t kMostAhead = 10'000;   // inputs waiting for a worker
 constexpr size_t kFoundAtOnce = 64;     // names examined between two calls to poll
 constexpr size_t kMostWaiting = 1'000;  // results that may wait for an earlier one
 

@@ -17,7 +17,7 @@
 #include "cli/run/worker_process.h"
 
 struct ordered_output {
-    std::map<size_t, reply> waiting;  // replies that wait for those of earlier inputs
+    std::map<size_t, reply> waiting;  // replies waiting for those of earlier inputs
     size_t next = 0;                  // index of the input whose reply is next
     size_t total = 0;                 // number of inputs, or 0 if not all are known yet
     size_t done = 0;                  // replies of analyses that were not stopped

@@ -42,7 +42,7 @@ struct record {
     std::string written = {};  // path of the written marker file, or empty
 };
 
-// Converts a time of the record to the time of a player, at least 0.
+// Converts a time in the record to a player's time, at least 0.
 double player_ms(const record &result, double ms);
 
 // Returns the end of a highlight of length_s seconds, or the end of the song if that is earlier.

@@ -17,8 +17,8 @@
 std::string clip_path(const std::string &input, const options &opts);
 
 // Writes opts.length_s seconds of the song, starting at the highlight, with fades of opts.fade_s
-// seconds at both ends. Times are those of a player. Fails if stop_fd becomes readable, which
-// requests a stop. A failure leaves the target unchanged.
+// seconds at both ends. All times are player times. Fails if stop_fd becomes readable,
+// which requests a stop. A failure leaves the target unchanged.
 failure write_clip(const record &result, const options &opts, const std::string &target,
                    int stop_fd, const song_file &song);
 

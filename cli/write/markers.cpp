@@ -33,8 +33,8 @@ constexpr frame_rate kRates[] = {
 };
 constexpr int64_t kStartMinutes = 60;  // timecode of frame 0, the usual start in editors
 
-// The highlight from its start to its end, or a beat, whose start and end are equal. Times are in
-// milliseconds of the player's time.
+// The highlight from its start to its end, or a beat, whose start and end are equal. Times are
+// player times in milliseconds.
 struct mark {
     double start_ms;
     double end_ms;
@@ -133,8 +133,7 @@ std::string reaper_markers(const record &result, const frame_rate & /*rate*/) {
     return out;
 }
 
-// Returns a metadata file of FFmpeg. Its chapters are contiguous and begin at the start of the
-// song.
+// Returns an FFmpeg metadata file. Its chapters are contiguous and begin at the start of the song.
 std::string ffmetadata_chapters(const record &result, const frame_rate & /*rate*/) {
     std::vector<mark> chapters;
     for (const mark &entry : marks_of(result)) {
@@ -213,8 +212,8 @@ std::string fcpxml_markers(const record &result, const frame_rate &rate) {
 
 // ---- Formats based on JSON.
 
-// Returns a project of LosslessCut. Its segments are the highlight, then the spans from each beat
-// to the next one or to the end of the song.
+// Returns a LosslessCut project. Its segments are the highlight, then the spans from each beat to
+// the next one or to the end of the song.
 std::string losslesscut_project(const record &result, const frame_rate & /*rate*/) {
     const std::vector<mark> marks = marks_of(result);
     json segments = json::array();

@@ -50,7 +50,7 @@ struct plain_frame {
     }
 };
 
-// Returns the onset envelope, computed one analysis frame after the other.
+// Returns the onset envelope, computed one analysis frame at a time.
 std::vector<double> envelope(const TAVO_BEAT_CTX &beat, int32_t size, int32_t hop) {
     const plain_frame frame(size);
     std::vector<double> change, next, now = frame.decibels(beat.signal, beat.mel_matrix);

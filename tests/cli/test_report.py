@@ -120,7 +120,7 @@ class Report(Browser):
         for seconds, searched in ((60, [0, 42000]), (100, [18000, 52000])):
             self.put("song.wav", source=song(seconds=seconds, bpm=120, rate=8000, channels=1))
             self.assertEqual(view("song.wav", "--mode", "highlight")["searched_ms"], searched)
-        # The page shows the times of players, which skip an MP3 file's encoder delay.
+        # The page shows player times: players skip an MP3 file's encoder delay.
         subprocess.run(["lame", "--quiet", standard_song(), self.folder / "song.mp3"], check=True)
         page = view("song.mp3", "--length", "12")
         (result,) = self.run_json("--length", "12", "song.mp3")

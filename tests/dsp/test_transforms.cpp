@@ -18,7 +18,7 @@ using list = std::vector<double>;
 
 constexpr double kInf = std::numeric_limits<double>::infinity();
 
-// A plain FFT that computes one butterfly after the other, stage by stage.
+// A plain FFT that computes one butterfly at a time, stage by stage.
 void transform_by_stages(list &re, list &im, const TAVO_FFT_CTX &ctx) {
     const size_t size = re.size();
     for (size_t i = 0; i < size; ++i) {

@@ -22,7 +22,7 @@ namespace {
 constexpr unsigned kMaxSeconds = 30;  // of one job
 constexpr long kMaxMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
-// Number of calls tried per function; step between wrong values, 1 if TAVO_FAULTS is set.
+// Tries about kCalls calls per value, and every kStep-th fault (all if TAVO_FAULTS is set).
 constexpr int kCalls = 2, kStep = 31;
 
 // Returns wrong values: some near the limits of the named value, and some for every value.
