@@ -1,5 +1,5 @@
 // Measures the time of each stage of a job, for a 3-minute stereo song at 120 BPM. The benchmarks
-// whose names start with "mode 1" add up to a complete mode-1 job of a 44.1-kHz file.
+// whose names start with "mode 1" add up to a complete mode-1 job on a 44.1-kHz file.
 #include <benchmark/benchmark.h>
 
 #include <cstdlib>
@@ -157,7 +157,7 @@ void placement(benchmark::State &state) {
     analysis a;
     open_analysis(&a);
     _getOnsetEnvelope(&a.beat, kFrameSize, kHopSize);
-    // Large enough for any result: one beat per analysis frame, and every added beat.
+    // Large enough for any result: one beat per analysis frame, plus every added beat.
     std::vector<float> beats(static_cast<size_t>(a.beat.frame_count) + 50);
     for (auto _ : state) {
         benchmark::DoNotOptimize(getBeatCandi_MT(&a.beat, &a.onset, beats.data()));

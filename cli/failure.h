@@ -1,5 +1,4 @@
-// The result of each function of the command that can fail. It converts to true if the function
-// failed.
+// The result of a function that can fail. It converts to true if the function failed.
 //
 //     if (failure failed = write_file(target, content, force)) return failed;
 #ifndef TAVO_CLI_FAILURE_H

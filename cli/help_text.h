@@ -1,4 +1,4 @@
-// The texts of -h and --help, except the descriptions of the options.
+// The texts of -h and --help, except the option descriptions.
 #ifndef TAVO_CLI_HELP_TEXT_H
 #define TAVO_CLI_HELP_TEXT_H
 

@@ -11,8 +11,8 @@
 
 namespace {
 
-// Opens /dev/null in place of each closed standard stream, so that no pipe gets the number of the
-// stream. Opens it for reading only, so that writing still fails.
+// Opens /dev/null in place of each closed standard stream, so that no other file gets its
+// descriptor number. Opens it read-only, so that writes still fail.
 void open_standard_streams() {
     for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {
         if (fcntl(fd, F_GETFD) < 0) open("/dev/null", O_RDONLY);

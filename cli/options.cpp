@@ -60,7 +60,7 @@ int wrong_usage(const std::string &sentence) {
 }
 
 // The parser splits a FILE in square brackets at its commas. To prevent this, `shielded` puts this
-// byte before the opening bracket. The check of the value removes the byte.
+// byte before the opening bracket, and declare_all adds a validator that removes it.
 constexpr char kShield = '\x01';
 
 // Returns the arguments in the order that the parser requires, last to first.

@@ -64,7 +64,7 @@ constexpr int kExitFailed = 1;  // a file failed
 constexpr int kExitUsage = 2;
 constexpr int kExitSignal = 128;  // the number of the signal is added
 
-// Returns an exit status if the command must end now: after help, the version or wrong usage.
+// Returns an exit status after printing the help, the version or a usage error; otherwise nothing.
 std::optional<int> parse_options(int argc, char **argv, options &out);
 
 // True if the only input is a file, not a folder or a list.

@@ -22,8 +22,8 @@ int write_all(int fd, std::string_view bytes);
 
 using signal_handler = void (*)(int);
 
-// Installs a signal handler, without SA_RESTART, so that a blocked read returns. Returns the
-// previous handler.
+// Installs a signal handler without SA_RESTART, so that the signal interrupts a blocked read.
+// Returns the previous handler.
 signal_handler set_signal_handler(int number, signal_handler handler);
 
 // Waits for a child process to end and sets pid to -1. Returns the waitpid status.
@@ -41,8 +41,8 @@ struct temporary_file {
 // Returns null if memory runs out.
 std::shared_ptr<temporary_file> share_temporary_file();
 
-// Called in a worker. From then on, note_temporary_file stores the path in `file`, and a signal
-// removes that temporary file and ends the worker. Returns the number of the signal.
+// Called in a worker. From then on, note_temporary_file stores its path in `file`, and the signal
+// whose number is returned removes the temporary file and ends the worker.
 int remove_file_at_signal(temporary_file &file);
 
 // Stores the path of this worker's temporary file, or an empty path once the file is gone. A worker

@@ -38,7 +38,7 @@ if(TARGET tavo_command)
   install(FILES packaging/tavo.fish DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d)
 endif()
 
-# The page, if it has been built: cmake --preset web && cmake --build --preset web.
+# The web page, if it has been built: cmake --preset web && cmake --build --preset web.
 install(FILES build/web/tavo.html DESTINATION ${CMAKE_INSTALL_DATADIR}/tavo OPTIONAL)
 
 install(FILES README.md CHANGELOG.md packaging/copyright DESTINATION ${CMAKE_INSTALL_DOCDIR})

@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # scripts/demo.sh [FILE]
-# Installs what is missing, builds the release and analyses FILE, or a sample song that it generates.
+# Installs missing packages, builds the release and analyses FILE, or a sample song that it generates.
 set -euo pipefail
 if [[ $# -gt 1 ]]; then
   echo "usage: demo.sh [FILE]" >&2

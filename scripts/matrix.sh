@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # scripts/matrix.sh [NAME]...
-# Builds the library with every compiler, optimisation level and sanitizer listed below, or only those with the given
-# NAMEs. Fails if a build's results (in ms and BPM) are not identical to the golden ones.
+# Builds the library with every compiler, optimisation level and sanitizer listed below; NAMEs select some of these
+# builds. Fails if a build's results (in ms and BPM) are not identical to the golden ones.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 

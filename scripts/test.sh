@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # scripts/test.sh
-# Installs what is missing, checks the formatting, builds, and runs clang-tidy and every test, including the
-# fuzzers' corpora, in the release build and under the sanitizers. Ends with CTest's summary. Fails if any step fails.
+# Installs missing packages, checks the formatting, builds, and runs clang-tidy and every test, including the fuzzers'
+# corpora, in the release build and under the sanitizers. Ends with CTest's summary. Fails if any step fails.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 

@@ -103,7 +103,7 @@ function add(files) {
   run();
 }
 
-// Shows the song with the page template of --report.
+// Shows the song in a page made from the template of --report.
 function show(entry) {
   if (shown) URL.revokeObjectURL(shown.song.audio);
   shown = entry;

@@ -1,5 +1,5 @@
 // Replaces the pthread functions, because the page has no threads. pthread_create runs the job to
-// completion before it returns. A call inside the job fails, so the job does all the work itself.
+// completion before it returns. It fails if the job calls it, so the job does all the work itself.
 #include <errno.h>
 #include <pthread.h>
 #include <setjmp.h>

@@ -47,7 +47,7 @@ struct ffmpeg_process {
 
 using clock_type = std::chrono::steady_clock;
 
-// The prefix makes ffmpeg treat any name as a file: -x.mp3, http://x, a:b.mp3.
+// The prefix makes ffmpeg treat any name as a file, even -x.mp3, http://x and a:b.mp3.
 std::string input_name(const ffmpeg_task &task) {
     return "file:" + (task.fd >= 0 ? "/dev/stdin" : task.path);
 }
@@ -143,7 +143,7 @@ void kill_ffmpeg(ffmpeg_process &process) {
     wait_for_end(process.pid);
 }
 
-// Returns the first line of the messages, without the module's address and the file's name.
+// Returns the first line of the messages without the names of ffmpeg's module and of the file.
 std::string first_line(const ffmpeg_task &task, const std::string &message) {
     std::string line = message.substr(0, message.find('\n'));
     const size_t module_end = line.find("] ");

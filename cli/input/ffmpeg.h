@@ -1,4 +1,4 @@
-// Runs the ffmpeg program on one file, which is not trusted.
+// Runs the ffmpeg program on one untrusted file.
 //
 // Input: a file, and the arguments that describe the output. Output: the bytes that the program
 // writes to standard output. Used by song_file.h and write/clip.h in a worker process.
@@ -20,7 +20,7 @@ struct ffmpeg_task {
     std::vector<std::string> arguments;  // everything after the input
 };
 
-// Receives the program's standard output. A failure ends the program.
+// Receives the program's standard output. If it returns a failure, the program is killed.
 using byte_sink = std::function<failure(std::string_view bytes)>;
 
 // Searches PATH. Returns the path of the ffmpeg program, or an empty string.
@@ -33,7 +33,7 @@ failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink);
 
 constexpr int kIdleSeconds = 30;
 
-// Starts the timeline at 0 and fills gaps with silence, as players do.
+// An ffmpeg filter that starts the timeline at 0 and fills gaps with silence, as players do.
 constexpr const char *kPlayerTimeFilter = "aresample=async=1:first_pts=0";
 
 #endif

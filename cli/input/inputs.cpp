@@ -93,7 +93,7 @@ failure enter_folder(input_supply &supply, const std::string &path, const struct
     return {};
 }
 
-// Ends the search of a folder. Returns true if it becomes an input because it has no audio.
+// Ends the search of a folder. If it has no audio, stores it as a refused input and returns true.
 bool leave_folder(input_supply &supply, input &out) {
     const std::string path = std::exchange(supply.folder, "");
     if (supply.found == 0) {
@@ -134,7 +134,7 @@ failure cannot_read_list(int code) {
     return {system_sentence("The list of files cannot be read", code)};
 }
 
-// Refuses a song that was passed as a list by mistake, because it would yield thousands of names.
+// Refuses NUL bytes without -0, and a song passed by mistake, which would yield thousands of names.
 failure check_start(const name_list &list, char separator) {
     const file_kind kind = recognise_bytes(list.text);
     if (kind != file_kind::unknown) {

@@ -60,8 +60,8 @@ enum class supply_state {
 // Searches folders for audio files, which are recognised by content, not by name. Unsupported
 // formats count as audio, so that they are reported. With --recursive, subfolders and linked
 // folders are searched too, each once. An unreadable file or folder, a folder without audio, and an
-// input whose marker file or clip would replace that of another input get a refusal. Memory grows
-// with the folders searched and the files to be written, not with the length of a list.
+// input whose marker file or clip would replace that of another input get a refusal. Memory use
+// grows with the number of folders and output files, not with the length of a list.
 supply_state next_input(input_supply &supply, input &out);
 
 #endif

@@ -52,8 +52,8 @@ double mpeg_offset_ms(const std::string &path, int32_t rate, int32_t channels) {
     return 1000.0 * static_cast<double>(dropped) / rate;
 }
 
-// Returns the content of the first box of this type, and removes the boxes up to its end. If there
-// is no such box, or a box before it is damaged, returns nothing and removes all boxes.
+// Returns the content of the first box of this type. Removes that box and all boxes before it. If
+// there is no such box, or a box before it is damaged, returns nothing and removes all boxes.
 std::string_view next_box(std::string_view &boxes, std::string_view type) {
     while (!boxes.empty()) {
         const uint64_t size = big_endian(boxes, 0, 4);

@@ -1,8 +1,8 @@
 // The difference between the library's times and a player's. The library counts from the first
 // sample that it decodes, but players drop the encoder delay, which the file states.
 //
-// Input: an MP3 or MP4 file. Output: milliseconds for run/record.h. docs/FORMATS.md has the table.
-// Used by run/analyse.h.
+// Input: an MP3 or MP4 file. Output: milliseconds for run/record.h. docs/FORMATS.md lists the
+// offsets. Used by run/analyse.h.
 #ifndef TAVO_CLI_INPUT_PLAYER_OFFSET_H
 #define TAVO_CLI_INPUT_PLAYER_OFFSET_H
 

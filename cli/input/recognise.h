@@ -17,7 +17,7 @@ enum class file_kind { unknown, wav, aiff, flac, ogg, mp4, aac, mpeg, asf, matro
 
 constexpr size_t kKindBytes = 16;  // needed by recognise_bytes
 
-// Recognises the first bytes of a file, or those that follow its ID3v2 tags.
+// Recognises a format by the first bytes of a file, or by those after its ID3v2 tags.
 file_kind recognise_bytes(std::string_view head);
 
 // Returns 0, or errno if the file cannot be opened or read. Anything except a regular file has an
@@ -40,7 +40,7 @@ uint64_t big_endian(std::string_view bytes, size_t offset, size_t size);
 int64_t find_id3v2_end(const std::string &path, int &code);
 
 // Returns the reason why the library refused a file. `code` is TAVO_ERR_MEMORY or the result of
-// tavo_probe, which stored `stream`. Reads the file to find errors that the library does not name.
+// tavo_probe, which stored `stream`. Reads the file again to detect read errors.
 std::string explain_refusal(const std::string &path, int32_t code, const TAVO_STREAM &stream);
 
 // Returns the reason why an analysis received no audio or, with has_audio, only part of it.

@@ -15,7 +15,7 @@ number read_environment(const char *name) {
 
 void read_engine(number &index, number &count) {
     if ((index = read_environment("SLURM_ARRAY_TASK_ID"))) {
-        // Task numbers of a Slurm array may start anywhere and have steps.
+        // The task numbers of a Slurm array may start at any number and have any step.
         const int64_t first = read_environment("SLURM_ARRAY_TASK_MIN").value_or(0);
         const int64_t step = read_environment("SLURM_ARRAY_TASK_STEP").value_or(1);
         index = step > 0 ? (*index - first) / step : -1;

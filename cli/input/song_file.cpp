@@ -26,8 +26,8 @@ constexpr off_t kRateOffset = 24;                             // of the rate in 
 constexpr int64_t kHeaderBytes = 44;                          // of ffmpeg's header without tags
 constexpr int64_t kMostWavBytes = (int64_t{1} << 32) - 4096;  // a WAV file has 32-bit sizes
 
-// Limit on decoded sound: one minute plus this many samples per byte of the file. In the most
-// compact codecs, silence has about 1000. Without a limit, a wrong time stamp could add hours.
+// Limit on decoded sound: one minute plus this many samples per byte of the file. The most compact
+// codecs reach about 1000 for silence. Without a limit, a wrong time stamp could add hours.
 constexpr int64_t kMostSamplesPerByte = 2048;
 constexpr int64_t kSpareSeconds = 60;
 
@@ -144,8 +144,8 @@ failure store_sound(decoding &sound, std::string_view part) {
 }
 
 // Decodes the first audio stream of a file to a 16-bit mono WAV file in memory. Reads source_fd or,
-// if that is negative, `path`. Keeps the sample rate, or uses the nearest supported one. All times
-// are player times.
+// if that is negative, `path`. Keeps the sample rate, or uses the nearest supported one. Without
+// `filter`, times in the WAV file are player times.
 failure decode(const std::string &path, const options &opts, int stop_fd, int source_fd,
                const std::string &filter, song_file &song) {
     decoding sound;

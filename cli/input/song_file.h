@@ -1,8 +1,8 @@
 // A song in a form that the library can open: the file itself, the contents of a pipe, or the
 // output of ffmpeg.
 //
-// Input: a path that the user named. Output: a path for the library. Used by inputs.h and the
-// worker's files in run/.
+// Input: a path that the user named. Output: a path for the library. Used by inputs.h,
+// run/analyse.h, run/worker_process.h and write/clip.h.
 #ifndef TAVO_CLI_INPUT_SONG_FILE_H
 #define TAVO_CLI_INPUT_SONG_FILE_H
 
@@ -26,9 +26,9 @@ failure open_song(const std::string &path, int stop_fd, song_file &song);
 // unchanged.
 failure decode_song(const std::string &path, const options &opts, int stop_fd, song_file &song);
 
-// Decodes the open song at `path` again with ffmpeg, into `raised`. The output is the channel that
-// the library analyses, from offset_ms before a player's time 0, with each sample multiplied by
-// `gain` and clipped. After a failure there is nothing to close.
+// Decodes the open song at `path` again with ffmpeg, into `raised`. The output is the mono signal
+// that the library analyses. It starts offset_ms before player time 0, and each sample is
+// multiplied by `gain` and clipped. After a failure there is nothing to close.
 failure raise_song(const std::string &path, const options &opts, int stop_fd, const song_file &song,
                    double gain, double offset_ms, song_file &raised);
 

@@ -2,8 +2,8 @@
 const body = document.querySelector("#songs tbody");
 const heads = [...document.querySelectorAll("#songs thead th")];
 
-// Compares rows by the text of the first column or by the data-value of any other column. Rows
-// without a data-value come last.
+// Returns a function that compares rows by the text of the first column or by the data-value of any
+// other column. Rows without a data-value come last.
 function compare(column, sign) {
   return (a, b) => {
     const [x, y] = [a.cells[column], b.cells[column]];

@@ -1,6 +1,6 @@
-// The page that shows and plays a song's result, and the index of several songs' pages: --report.
+// The page that plays a song and shows its result, and the index of several such pages: --report.
 //
-// Input: a record (run/record.h) and its song_view. Output: HTML files that work without a network.
+// Input: a record (run/record.h) and its view (song_view.h). Output: HTML files that work offline.
 // Follows run/analyse.h. run/worker_process.h writes the pages, run/ordered_output.h the index.
 #ifndef TAVO_CLI_REPORT_REPORT_H
 #define TAVO_CLI_REPORT_REPORT_H
@@ -25,11 +25,11 @@ failure check_report(const std::string &target, bool force);
 failure write_report_page(const record &result, const options &opts, const std::string &target,
                           int stop_fd, std::string &row);
 
-// Returns the row of a song that failed.
+// Returns the index row of a song that failed.
 std::string failed_report_row(const record &result);
 
-// Write the index. They do nothing unless the options request an index. After a stop, the index has
-// the rows that were added before the stop.
+// These functions write the index if the options request one, and otherwise do nothing. After a
+// stop, the index has the rows that were added before the stop.
 failure begin_report_index(output_file &index, const options &opts);
 failure add_report_row(output_file &index, const std::string &row);
 failure finish_report_index(output_file &index, const options &opts);

@@ -36,7 +36,7 @@ function drawLoudness() {
   byId("loudname").hidden = song.loudness.length === 0;
   const top = Math.max(...song.loudness, song.mean, 1e-9);
   const y = (value) => (79 - value / top * 29).toFixed(2);
-  // A value is drawn in the middle of its window of 6 s.
+  // Each value is drawn in the middle of its 6-second window.
   const points = song.loudness.map((value, k) => `${song.sound_ms + 2000 * k + 3000} ${y(value)}`);
   if (points.length === 0) return;
   shape("path", { class: "loud", d: "M" + points.join("L") });
@@ -76,8 +76,8 @@ function drawTicks() {
   byId("times").replaceChildren(...ticks);
 }
 
-// ---- The picture as a file. It shows the visible part. Sizes are in pixels and colours are
-// attributes, so that every program draws the picture in the same way.
+// ---- The picture as a file. It shows the visible part of the song. Sizes are in pixels and
+// colours are attributes, so that every program draws the same picture.
 
 function pictureSvg() {
   const width = 1200, height = 360, top = 34, bottom = 330;
@@ -132,10 +132,10 @@ function zoomToBeat() {
   show(nearest - 1000, nearest + 1000);
 }
 
-// ---- Sound. A linked file plays in an audio element. A page from disk cannot route it through an
-// audio context, so the clicks have their own context. An embedded file is decoded and plays in the
-// context of the clicks, so that both share one clock. Browsers drop the encoder delay that the
-// file states, and the page's times do not include it.
+// ---- Sound. A linked file plays in an audio element. A page opened from disk cannot route it
+// through an audio context, so the clicks have their own context. An embedded file is decoded and
+// plays in the context of the clicks, so that both share one clock. Browsers drop the encoder delay
+// that the file states, so the page's times exclude it.
 
 let context = null;
 function wake() {

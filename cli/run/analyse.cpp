@@ -46,7 +46,7 @@ const TAVO_INFO *wait_for_result(const job_end &end, int stop_fd) {
     return end.result.load(std::memory_order_acquire);
 }
 
-// Mean square of the loudest window, full scale 1; 0 in mode beats.
+// Returns the mean square of the loudest window, full scale 1; 0 in mode beats.
 double loudest_passage(const TAVO_CTX *ctx) {
     int32_t count = 0;
     const float *curve = tavo_get_loudness(ctx, &count);
@@ -76,7 +76,7 @@ void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, const song_file &so
     out.beats_ms.assign(info->beat_times, info->beat_times + info->beat_count);
 }
 
-// Runs the job of an instance and releases it.
+// Runs the job of an instance and releases the instance.
 void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, const song_file &song, record &out) {
     job_end end;
     end.fd = eventfd(0, EFD_CLOEXEC);
@@ -98,7 +98,7 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, const song_file &s
 void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out);
 
 // Replaces a coarse highlight with that of the amplified song. In mode both, the result does not
-// show whether the highlight is coarse, so the song itself is first searched again.
+// show whether the highlight is coarse, so the original song is first searched again.
 void refine_quiet_song(const options &opts, int stop_fd, song_file &song, record &out) {
     options search = opts;
     search.mode = TAVO_MODE_HIGHLIGHT;
@@ -166,7 +166,7 @@ void analyse_opened(const options &opts, int stop_fd, song_file &song, record &o
     if (opts.normalize && has_result) refine_quiet_song(opts, stop_fd, song, out);
 }
 
-// Processor time of this process and its ffmpeg processes, all threads, user and system.
+// Returns the user and system time of all threads of this process and its ffmpeg processes.
 int64_t cpu_time_ms() {
     int64_t sum = 0;
     for (const auto who : {RUSAGE_SELF, RUSAGE_CHILDREN}) {

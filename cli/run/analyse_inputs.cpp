@@ -51,7 +51,7 @@ supply_state find_next(run_state &state, job &next) {
     return found ? supply_state::ready : supply_state::ended;
 }
 
-// True if the input belongs to this command's shard and is not stored yet.
+// True if the input belongs to this command's shard and is not skipped as already stored.
 bool is_wanted(run_state &state, job &next) {
     if (!in_shard(state.opts.share, next.entry.path)) return false;
     if (state.opts.from_store || next.entry.refusal) return true;

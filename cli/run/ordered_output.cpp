@@ -92,7 +92,7 @@ void draw_progress(ordered_output &output) {
 
     winsize terminal{};
     ioctl(STDERR_FILENO, TIOCGWINSZ, &terminal);
-    // Some terminals wrap after the last column.
+    // Some terminals wrap after the last column, so it stays empty.
     const size_t columns = (terminal.ws_col > 0 ? terminal.ws_col : kUsualColumns) - 1;
     const std::string text = progress_text(output, run.count());
     std::string line;

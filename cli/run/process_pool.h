@@ -1,5 +1,5 @@
 // Starts, feeds, stops and reaps the worker processes. The library allows one instance per process,
-// so several files at once need several workers. A crashing worker affects one file.
+// so several files at once need several workers. A crash affects only one file.
 //
 // The command and a worker are connected by a pair of sockets. When the command closes its end for
 // writing, the worker stops its analysis and ends. When a worker ends, the command reads
@@ -53,9 +53,9 @@ struct process_pool {
     bool is_stopping = false;
 };
 
-// Sends the job to an idle worker, or to a new one if there are fewer than --jobs. If the input has
-// a refusal or no worker can be started, on_reply receives the failure at once. Returns false, with
-// `next` unchanged, if all workers are busy. Does not return in a new worker process.
+// Sends the job to an idle worker, or to a new one if fewer than --jobs are running. If the input
+// has a refusal or no worker can be started, on_reply receives the failure at once. Returns false,
+// with `next` unchanged, if all workers are busy. Does not return in a new worker process.
 bool send_job(process_pool &pool, job &next);
 
 // Asks the workers to end. With is_stop they abort their jobs, and are killed if they have not

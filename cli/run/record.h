@@ -52,7 +52,7 @@ double highlight_end_ms(const record &result, int32_t length_s);
 // does not, because a seek has moved the start.
 bool has_refinement(const record &result);
 
-// True if the start of the highlight is exact. Otherwise it is a point of the loudness curve.
+// True if the start of the highlight is exact. Otherwise it is on the loudness curve's 2 s grid.
 bool is_refined(const record &result);
 
 #endif

@@ -7,7 +7,7 @@
 // instead. Returns false with errno if the system refuses.
 bool watch_for_stop();
 
-// Ignores these signals in a worker process, which ends when its socket is closed.
+// Ignores the stop signals in a worker process, which ends when its socket is closed.
 void ignore_stop_signals();
 
 int stop_signal();  // number of the first signal, or 0

@@ -82,7 +82,7 @@ failure check_side_files(const request &message, const options &opts) {
         failed = check_report(report_page_path(opts, message.index, message.path), opts.force);
     }
     if (!failed && opts.markers != nullptr) {
-        // With a store, an existing file may belong to this song, so write_markers compares it.
+        // With a store, an existing file may be from this song, so write_markers compares contents.
         const bool may_exist = opts.force || is_stored(opts);
         failed = check_target(marker_path(message.path, opts), may_exist);
     }
@@ -92,7 +92,7 @@ failure check_side_files(const request &message, const options &opts) {
     return failed;
 }
 
-// `row` receives the song's index row if a report is requested.
+// Writes the requested page, markers and clip. `row` receives the song's index row, if any.
 failure write_side_files(record &result, const options &opts, uint64_t index, int stop_fd,
                          const song_file &song, std::string &row) {
     failure failed;
@@ -149,7 +149,7 @@ std::string serve(const request &message, const options &opts, int stop_fd) {
 }
 
 // Each job reuses the heap of the previous one instead of asking the system for new pages. The heap
-// starts large enough for a song, in huge pages. Each of them takes one page fault instead of 512.
+// starts large enough for a song, in huge pages: each takes one page fault instead of 512.
 void prepare_heap() {
     mallopt(M_TRIM_THRESHOLD, kFreeMemoryKept);
     mallopt(M_MMAP_THRESHOLD, kLargestThreshold);  // so that the block below is part of the heap

@@ -8,8 +8,8 @@
 
 namespace {
 
-// Returns null if the program was built without PostgreSQL. The client library of PostgreSQL
-// depends on two dozen others, so the module that needs it is loaded on demand.
+// Returns null if the program was built without PostgreSQL. PostgreSQL's client library depends on
+// two dozen others, so the module that needs it is loaded on demand.
 const database_kind *postgresql_database() {
     void *module = dlopen("libtavo_postgresql.so", RTLD_NOW | RTLD_LOCAL);
     if (module == nullptr) return nullptr;

@@ -37,7 +37,7 @@ struct database_kind {
     failure (*open)(const std::string &location, bool read_only, connection &out);
 };
 
-// Finds the kind of database for the URL of a store, and the location for its open function.
+// Finds the kind of database for a store's URL, and the location to pass to its open function.
 failure find_database(const std::string &url, const database_kind **kind, std::string &location);
 
 // Returns the text with *** in place of each word that also occurs in the URL's user name or

@@ -1,4 +1,4 @@
-// The module libtavo_postgresql.so, which needs the client library of PostgreSQL.
+// The module libtavo_postgresql.so, which needs PostgreSQL's client library.
 #include <libpq-fe.h>
 
 #include <algorithm>

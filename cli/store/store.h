@@ -61,7 +61,7 @@ failure find_song(store &db, const std::string &path, file_state &file, bool &is
 // store, results stay in the batch until close_store.
 failure add_song(store &db, stored_song &&song);
 
-// Commits a batch that is old.
+// Commits the batch if it is old.
 failure commit_old_batch(store &db);
 int batch_timeout_ms(const store &db);  // time until the batch is old, for poll; -1 if it is empty
 

@@ -52,7 +52,7 @@ std::vector<character> characters_of(std::string_view text) {
 }
 
 // True for a character that moves the cursor or reorders text on a terminal: control characters,
-// line separators, and marks of the writing direction.
+// line separators and bidirectional marks.
 bool is_control(uint32_t point) {
     const auto is_in = [=](uint32_t first, uint32_t last) {
         return point >= first && point <= last;

@@ -1,16 +1,16 @@
-// Converts file names, which may be any bytes, to readable text, JSON, pages and URLs.
+// Converts file names, which may contain any bytes, to readable text, JSON, pages and URLs.
 #ifndef TAVO_CLI_WRITE_FILE_NAMES_H
 #define TAVO_CLI_WRITE_FILE_NAMES_H
 
 #include <map>
 #include <string>
 
-// Returns one line of text. Control characters, line separators and marks of the writing direction
-// become \n, \t or \xNN; a backslash is doubled; bytes that are not UTF-8 become \xNN.
+// Returns one line of text. Control characters, line separators and bidirectional marks become \n,
+// \t or \xNN; a backslash is doubled; bytes that are not UTF-8 become \xNN.
 std::string shown(const std::string &bytes);
 
-// Returns JSON text on one line: control characters, line separators and marks of the writing
-// direction become \uNNNN. The meaning of the JSON stays the same.
+// Returns JSON text on one line: control characters, line separators and bidirectional marks become
+// \uNNNN. The meaning of the JSON stays the same.
 std::string json_text(const std::string &utf8);
 
 // Returns valid UTF-8: each byte that is not part of a character becomes U+FFFD.

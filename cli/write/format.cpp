@@ -21,7 +21,7 @@ namespace {
 // highlight.
 constexpr double kRefinedPower = 0.1;
 
-// Keys of json_object, in the order of the columns of CSV.
+// Keys of json_object, in the order of the CSV columns.
 constexpr const char *kColumns[] = {"file",      "mode",        "status",    "sample_rate",
                                     "channels",  "duration_ms", "offset_ms", "hl_pos_ms",
                                     "hl_end_ms", "hl_refined",  "bpm",       "beat_count",
@@ -107,8 +107,7 @@ std::string seconds(double ms) {
     return formatted("%.3f", ms / 1000.0);
 }
 
-// Returns the names of the fields and their values for a song. A value that the song lacks is
-// empty.
+// Returns the fields' names and their values for a song. A value that the song lacks is empty.
 std::vector<std::pair<std::string, std::string>> fields_of(const record &result) {
     const double start = player_ms(result, result.hl_pos_ms);
     const double end = player_ms(result, region_end_ms(result));
@@ -150,7 +149,7 @@ std::string format_record(const options &opts, const record &result) {
             return csv_record(result);
         case result_format::print:
             if (result.status != outcome::ok) return "";
-            // The template was checked with the options.
+            // parse_options has already checked the template.
             return fill_template(opts.print, result, filled) ? "" : filled;
         case result_format::markers:  // name of the written file
             return result.written.empty() ? "" : shown(result.written) + "\n";

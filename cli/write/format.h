@@ -1,4 +1,4 @@
-// A record as text for standard output, in one of the formats.
+// Formats a record as text for standard output.
 //
 // Input: a record (run/record.h). Output: text, which run/ordered_output.h writes. Follows
 // run/analyse.h.

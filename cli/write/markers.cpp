@@ -109,7 +109,7 @@ std::string audacity_labels(const record &result, const frame_rate & /*rate*/) {
     return out;
 }
 
-// Returns guides. Each line has a time, a space and the comment of the guide. A guide is a point.
+// Returns guides. Each line has a time, a space and a comment. A guide is a point in time.
 std::string kdenlive_guides(const record &result, const frame_rate & /*rate*/) {
     std::string out;
     for (const mark &entry : marks_of(result)) {
@@ -171,9 +171,9 @@ std::string edl_markers(const record &result, const frame_rate &rate) {
     return out;
 }
 
-// ---- Final Cut Pro's XML, version 1.8.
+// ---- Final Cut Pro XML, version 1.8.
 
-// Returns an attribute of an element. The value must already be escaped.
+// Returns an XML attribute. The value must already be escaped.
 std::string attribute(const char *name, const std::string &value) {
     return std::string(" ") + name + "=\"" + value + "\"";
 }
@@ -233,7 +233,7 @@ std::string losslesscut_project(const record &result, const frame_rate & /*rate*
     return project.dump(2) + "\n";
 }
 
-// Returns a span of video frames in OpenTimelineIO.
+// Returns a range of video frames as an OpenTimelineIO TimeRange.
 json range(int64_t start, int64_t length, const frame_rate &rate) {
     const auto time = [&](int64_t count) {
         return json{{"OTIO_SCHEMA", "RationalTime.1"},
@@ -244,7 +244,7 @@ json range(int64_t start, int64_t length, const frame_rate &rate) {
         {"OTIO_SCHEMA", "TimeRange.1"}, {"start_time", time(start)}, {"duration", time(length)}};
 }
 
-// Returns a timeline of OpenTimelineIO with the song as its only clip and the markers on the clip.
+// Returns an OpenTimelineIO timeline with the song as its only clip and the markers on the clip.
 std::string otio_timeline(const record &result, const frame_rate &rate) {
     json markers = json::array();
     for (const mark &entry : marks_of(result)) {

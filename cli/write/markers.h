@@ -27,11 +27,11 @@ const std::vector<marker_format> &marker_formats();
 // Returns the format with this word, or null.
 const marker_format *find_marker_format(const std::string &word);
 
-// Returns the names of the rates of --fps, in order.
+// Returns the names of the --fps rates, in order.
 std::vector<std::string> frame_rate_names();
 
-// Returns the path of the marker file of an input. A name that is too long for a file system is
-// cut, and a hash is added.
+// Returns the path of an input's marker file. A name that is too long for a file system is cut, and
+// a hash is added.
 std::string marker_path(const std::string &input, const options &opts);
 
 // Returns the whole content of the file.

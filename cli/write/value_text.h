@@ -1,4 +1,4 @@
-// Texts that several parts of the command use: words of the interface, times, counts and errors.
+// Texts that several parts of the command use: mode names, times, counts and errors.
 #ifndef TAVO_CLI_WRITE_VALUE_TEXT_H
 #define TAVO_CLI_WRITE_VALUE_TEXT_H
 

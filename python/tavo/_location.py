@@ -1,6 +1,6 @@
 """Finds the library and the command relative to this package.
 
-The two constants are the paths in a wheel. cmake --install replaces them.
+_TO_LIBRARY and _TO_COMMAND are the paths in a wheel. cmake --install installs a copy with other paths.
 """
 
 import os

@@ -58,7 +58,7 @@ class Result:
         return "".join(f"{time:.6f}\n" for time in self.beats)
 
     def to_jams(self) -> Dict[str, Any]:
-        """Returns the result as JAMS: beat and tempo annotations, and the start of the highlight as a tag_open."""
+        """Returns the result as JAMS: beat and tempo annotations, and a tag_open annotation for the highlight."""
         annotations = []
         if self.tempo_bpm is not None:
             start = self.highlight_ms / 1000.0 if self.highlight_ms is not None else 0.0
