@@ -1,5 +1,5 @@
 // Code that the fuzzers share. A fuzzer turns an input into valid arguments and aborts if the
-// library breaks a promise. Any audio file can be an input: its last bytes determine the choices.
+// library breaks a promise. Any audio file can be an input. Its last bytes select the arguments.
 #ifndef TAVO_FUZZ_FUZZ_H
 #define TAVO_FUZZ_FUZZ_H
 
@@ -25,8 +25,8 @@ inline void must(bool condition, const char *promise) {
     abort();
 }
 
-// Reads at most `count` values: all are small integers, or all are between 0 and 1, or all are
-// arbitrary bit patterns, which include infinities and NaN.
+// Reads at most `count` values of one kind: small integers, values from 0 to 1, or arbitrary bit
+// patterns, which include infinities and NaN.
 template <typename T>
 std::vector<T> values(input *in, size_t count) {
     const int scale = in->ConsumeIntegralInRange(0, 2);

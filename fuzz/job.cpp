@@ -7,7 +7,7 @@ namespace {
 
 using fuzz::must;
 
-// Appends 16-bit samples: clicks over quiet noise. Formats other than WAV see arbitrary bytes.
+// Appends 16-bit samples: clicks over quiet noise. In formats other than WAV they are junk bytes.
 void pad(std::vector<uint8_t> *song, size_t bytes) {
     uint32_t noise = 1;
     for (size_t i = 0; i < bytes; i += 2) {

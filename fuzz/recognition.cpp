@@ -1,5 +1,5 @@
-// Fuzzes the recognition of a file's format. Some inputs get zeros in the middle, which move their
-// second half to the scan's limit of 32 KiB.
+// Fuzzes the recognition of a file's format. In some inputs, zeros are inserted in the middle to
+// move the second half close to the scan's limit of 32 KiB.
 #include "fuzz/fuzz.h"
 #include "media_source/mtsrc.h"
 

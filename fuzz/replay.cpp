@@ -1,5 +1,5 @@
-// replay RUNS DIR...: runs the fuzzer on every file in each DIR, then on RUNS other inputs, which
-// are the same each time. After a failure, the file PROGRAM.last contains the input.
+// replay RUNS DIR...: runs the fuzzer on every file in each DIR, then on RUNS generated inputs,
+// which are the same each time. After a failure, the file PROGRAM.last contains the failing input.
 #include <fcntl.h>
 
 #include <ctime>

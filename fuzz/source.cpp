@@ -1,5 +1,5 @@
-// Fuzzes media sources with any file. A stream must have its stated duration. Requests of different
-// sizes from one position must return the same bytes.
+// Fuzzes media sources with arbitrary files. A stream must be as long as its stated duration, and
+// requests of different sizes from one position must return the same bytes.
 #include "common/tavo_ctx.h"
 #include "fuzz/fuzz.h"
 #include "media_source/mtsrc_ctx.h"

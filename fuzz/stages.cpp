@@ -1,5 +1,5 @@
-// Fuzzes the stages of the analysis: checks properties of the results and compares some with plain
-// implementations. All attempts to start a thread fail, so the calling thread does all work.
+// Fuzzes the stages of the analysis: checks properties of the results and compares some of them
+// with plain implementations. No thread can be started, so the calling thread does all the work.
 #include <pthread.h>
 
 #include <cerrno>
@@ -44,7 +44,7 @@ int32_t choose_rate(fuzz::input *in) {
 }
 
 // A plain implementation of the windowed-sinc converter. Returns the number of samples appended to
-// `out`, or -1 for a phase out of range.
+// `out`, or -1 if a phase is out of range.
 int64_t convert_by_definition(const dorn_resampler_state &s, const std::vector<int16_t> &in,
                               std::vector<int16_t> *out) {
     const auto len = static_cast<int64_t>(in.size());
@@ -74,7 +74,7 @@ int64_t convert_by_definition(const dorn_resampler_state &s, const std::vector<i
     }
 }
 
-// Compares the interpolator (up to three channels) and complete conversions (mono) with plain ones.
+// Compares interpolations (up to three channels) and complete mono conversions with plain versions.
 // A complete conversion outputs interpolated samples or block means, followed by zeros.
 void convert(fuzz::input *in) {
     const auto state = std::make_unique<dorn_resampler_state>();
@@ -167,7 +167,7 @@ void search_curve(fuzz::input *in) {
 
 // --- Stages 4 to 6: beats
 
-// Runs the tempo estimate, the threshold and the beat selection on an envelope of repeated values.
+// Runs the tempo estimate, the threshold and the beat selection on an envelope that repeats `part`.
 void find_beats(fuzz::input *in) {
     const int32_t limit = in->ConsumeIntegralInRange(-2, 40);
     const int32_t free_tempo = in->ConsumeBool() ? in->ConsumeIntegralInRange(30, 200) : 0;

@@ -1,5 +1,5 @@
-# Builds the library with toolchain.cmake, which replaces the NDK's file, and checks the result. The log library and
-# the codec library in the directory LIBRARIES replace those of a device.
+# Builds the library with toolchain.cmake, which replaces the NDK's toolchain file, and checks the result. The log
+# library and the codec library in the directory LIBRARIES replace those of a device.
 # Arguments: -DSOURCE=... -DDIRECTORY=... -DLIBRARIES=...
 file(REMOVE_RECURSE ${DIRECTORY})
 set(configure ${CMAKE_COMMAND} -S ${SOURCE} -B ${DIRECTORY} -G Ninja -DCMAKE_BUILD_TYPE=Release

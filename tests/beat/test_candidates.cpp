@@ -50,7 +50,7 @@ frames find_beats(const envelope &env) {
 
 }  // namespace
 
-// At 120 BPM, beats are at least 43 frames apart. Without a limit, max_beats is 0 or -1.
+// At 120 BPM, beats are at least 43 frames apart. A max_beats of 0 or -1 sets no limit.
 TEST(Candidates, LargerPeaksComeFirst) {
     EXPECT_EQ(find_beats({1, 90, {}}), frames{});
     EXPECT_EQ(find_beats({500, 0, {{100, 5}}}), frames{});
@@ -67,15 +67,15 @@ TEST(Candidates, LargerPeaksComeFirst) {
     }
 }
 
-// At 40 BPM, the threshold's window is one frame longer than this song, so it is cut. The threshold
-// at frame 200 is between 5.6 and 5.7.
+// At 40 BPM, the threshold's window exceeds this song by one frame and is cut. The threshold at
+// frame 200 is between 5.6 and 5.7.
 TEST(Candidates, WindowThatNearlyFitsIsCut) {
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.6}}, {}, 0, 8}), frames{});
     EXPECT_EQ(find_beats({257, 40, {}, {{200, 5.7}}, {}, 0, 8}), frames{200});
 }
 
-// The smallest distance of beats is 3 s up to 95 BPM and 1 s above, rounded up to whole beat
-// periods. A gap is filled if it exceeds three such distances or lasts 6 s.
+// The smallest distance between beats is 3 s at up to 95 BPM and 1 s at higher tempos, rounded up
+// to whole beat periods. A gap is filled if it exceeds three such distances or lasts 6 s.
 TEST(Candidates, SmallestDistanceAndLongGapDependOnTheTempo) {
     const std::tuple<int32_t, int64_t, int64_t, size_t> cases[] = {
         {96, 52, 0, 1},    {96, 53, 0, 2},    {95, 134, 0, 1},   {95, 135, 0, 2},
@@ -107,7 +107,7 @@ TEST(Candidates, LongGapsGetTheirStrongestPeaks) {
     EXPECT_EQ(find_beats(env), (frames{100, 300, 400, 500, 600, 700, 800}));
 }
 
-// Each of the twelve gaps has five peaks. No gap is filled after the 46th added beat.
+// Each of the twelve gaps has five peaks. Once 46 beats have been added, no more gaps are filled.
 TEST(Candidates, AtMostFiftyBeatsAreAdded) {
     envelope env = {4300, 120, {}};
     for (int64_t k = 0; k <= 12; ++k) {

@@ -22,8 +22,8 @@ int32_t estimate(std::vector<double> env, const std::vector<pulse_pair> &pairs =
 
 }  // namespace
 
-// Each pair of pulses correlates only at its own lag: 20 frames are 129 BPM, 27 are 95 BPM. Two
-// rows that differ only in a weight show where another tempo begins to win.
+// Each pair of pulses correlates only at its own lag. A lag of 20 frames is 129 BPM, one of 27 is
+// 95 BPM. Two rows that differ only in a weight show where another tempo begins to win.
 TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     const struct {
         std::vector<std::pair<size_t, double>> weights;  // of each lag
@@ -45,7 +45,7 @@ TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
         // A tempo wins over half that tempo unless the slower one correlates much more.
         {{{20, 1}, {40, 1.30}}, 129},
         {{{20, 1}, {40, 1.33}}, 64},
-        // The longest lags that are scored: 42 with twice the lag, 27 with three times the lag.
+        // The longest lag scored with its double is 42. The longest scored with its triple is 27.
         {{{42, 1}, {27, 0.475}}, 61},
         {{{27, 1}, {81, 5.6}}, 31},
     };

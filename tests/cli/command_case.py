@@ -41,7 +41,7 @@ def wav(seconds=2.0, rate=44100, channels=1, bits=16, tag=1, data_size=None, sam
     return head + b"data" + struct.pack("<I", size) + data
 
 
-# Placed before a command, makes root obey file permissions.
+# Prefix for a command that makes root obey file permissions.
 AS_ORDINARY_USER = [] if os.getuid() != 0 else [
     "setpriv", "--inh-caps=-all", "--bounding-set=-dac_override,-dac_read_search"]
 

@@ -24,8 +24,8 @@ FCPXML = {  # elements and their required attributes, from Final Cut Pro's DTD
 
 
 def timecodes(base, dropped):
-    """Maps the timecodes of five minutes, from one hour on, to frame numbers. Drop-frame timecode skips the first frame
-    numbers of each minute, except every tenth minute."""
+    """Maps the timecodes of five minutes, starting at one hour, to frame numbers. Drop-frame timecode skips the first
+    frame numbers of each minute, except every tenth minute."""
     places = ((minute, second, frame) for minute in range(5) for second in range(60) for frame in range(base)
               if second or frame >= dropped or minute % 10 == 0)
     return {f"01:{minute:02}:{second:02}{';' if dropped else ':'}{frame:02}": number

@@ -107,14 +107,14 @@ class Report(Browser):
             self.run_tavo("--report", "page.html", "--force", *arguments, name)
             return json.loads(re.search(r'id="data">(.*?)</script>', (self.folder / "page.html").read_text())[1])
 
-        # Silence for 4 s is followed by a square wave of 6 s at half of full scale.
+        # The song is silent for 4 s and then a square wave at half of full scale for 6 s.
         rate, level = 8000, 32768 // 2
         loud = b"".join(struct.pack("<h", level if i // 40 % 2 else -level) for i in range(6 * rate))
         self.put("steps.wav", wav(seconds=10, rate=rate)[:44] + bytes(2 * 4 * rate) + loud)
         page = view("steps.wav", "--mode", "highlight")
         wave = page["wave"]  # pairs for 4000 columns of 2.5 ms; the wave starts at column 1600
         self.assertEqual((len(wave), {*wave[:3198]}, {*wave[3202:]}), (8000, {0}, {-127, 127}))
-        # The square wave fills a third, two thirds and all of the three windows. The last value is the mean.
+        # The square wave fills a third of the first window, two thirds of the second and all of the third.
         for value, expected in zip([*page["loudness"], page["mean"]], (0.348, 0.669, 0.969, 0.662), strict=True):
             self.assertAlmostEqual(value, expected, delta=0.001)
         for seconds, searched in ((60, [0, 42000]), (100, [18000, 52000])):

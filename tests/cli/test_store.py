@@ -130,7 +130,7 @@ class Store(Case):
         self.run_tavo(*words, "--force", message=b"1 stored, 2 known")
 
     def test_a_store_of_the_first_version(self):
-        """An older store has no columns offset_ms and decoder. Here some rows are damaged, too."""
+        """An older store lacks the columns offset_ms and decoder. In this one, some rows are also damaged."""
         self.put("a.wav")
         self.put("bad.wav", content=b"RIFF" + bytes(60))
         self.run_tavo(*STORE, "a.wav", "bad.wav", status=1)

@@ -85,7 +85,7 @@ class Workers(Case):
                 self.assertTrue(select.select([end], [], [], 60)[0], "the worker goes on")
 
     def test_a_stop_keeps_what_is_finished(self):
-        # A terminal signals all processes, `kill` only one. Results waiting for an earlier file are still printed.
+        # A terminal signals all processes, but `kill` signals one. Results that wait for an earlier file are printed.
         for send, number, words, busy, finished in (
                 (os.kill, signal.SIGTERM, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),
                 (os.killpg, signal.SIGINT, "a.wav long.wav ./a.wav", "long.wav", ["a.wav"]),

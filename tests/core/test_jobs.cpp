@@ -32,7 +32,7 @@ job::result run(const std::string &path, int32_t mode, int32_t max_beats = 0) {
     return result;
 }
 
-// Returns true if there is a drum hit within two hops of the time.
+// Returns true if there is a drum hit within two hops of `ms`.
 bool is_on_a_hit(float ms) {
     const std::vector<double> &hits = core_song::whole().song.hits;
     return std::any_of(hits.begin(), hits.end(), [ms](double hit) {
@@ -52,7 +52,7 @@ TEST(Jobs, BeatsFallOnTheDrums) {
     EXPECT_GE(on_hits * 10, result.beat_count * 9);
 }
 
-// The beats of mode 2 are those of mode 1 for a copy of the song from the highlight on.
+// Mode 2 finds the same beats as mode 1 does in a copy of the song that starts at the highlight.
 TEST(Jobs, BothFindsTheBeatsOfTheRestOfTheFile) {
     const job::result both = run(core_song::whole().path, TAVO_MODE_BOTH, 7);
     ASSERT_GT(both.hl_pos, 1000);
@@ -69,7 +69,7 @@ int32_t read_nothing(mtsrc_ctx *, int32_t, mtsrc_frame *) {
     return TAVO_ERR_READ;
 }
 
-// Only the modes with beats report a failure. If only the conversion fails, the highlight is found.
+// Only the modes with beats report a failure. If only the conversion fails, a highlight is found.
 TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     for (const bool decodes : {false, true}) {
         for_each_mode(kModes, [decodes](int32_t mode, TAVO_CTX *ctx) {
@@ -91,8 +91,8 @@ TEST(Jobs, FailuresAreReportedInTheModesWithBeats) {
     }
 }
 
-// The beat analysis is called directly, for an analysis signal in the instance. In mode 2 it adds
-// the highlight's start to the beats. In mode 0, which has no onset context, it reports a failure.
+// The test stores an analysis signal and calls the beat analysis directly. Mode 2 adds the
+// highlight's start to the beats. Mode 0, which has no onset context, reports a failure.
 TEST(Jobs, BeatAnalysisAloneReportsInEveryMode) {
     const support::song song = support::make_song({11025, 1, 20.0, 120.0, 1, 0.0});
     std::vector<float> beats[3];

@@ -172,7 +172,7 @@ TEST(Lifecycle, StopDuringDecodingSkipsTheBeats) {
             original_get_frm = ctx->seg[0].src->get_frm;
             for (int32_t i = 0; i < ctx->seg_count; ++i) ctx->seg[i].src->get_frm = read_after_stop;
             block_callback_of(ctx);
-            // Order of thread starts: the job's, four for decoding, the one that awaits the job.
+            // Threads start in this order: the job, four decoders, the one that awaits the job.
             fault::arm({fault::kThread, watched ? INT64_MAX : 5});
             ASSERT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
             while (fault::counted_calls() < 5) std::this_thread::yield();

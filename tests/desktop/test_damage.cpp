@@ -1,5 +1,5 @@
-// Tests that damage does not change audio far from it, in every format. fuzz/source.cpp tests that
-// damaged files do no harm.
+// Tests in every format that damage does not change audio far from it. fuzz/source.cpp tests that
+// damaged files cause no failures.
 #include "tests/desktop/codec_test.h"
 
 namespace codec_test {
@@ -11,10 +11,10 @@ constexpr size_t kSlack = 2 * 4608;       // samples that may differ before the 
 constexpr size_t kRecovery = 3 * 44'100;  // samples that may differ after the damage
 constexpr int kOffsets = 3;
 
-// Condition under which the samples long after the damage must be bit-identical.
+// When the samples long after the damage must equal those of the undamaged file.
 enum end_of_song {
     kNever,    // the decoder's noise depends on earlier frames
-    kInPlace,  // if no bytes have moved: the file contains offsets
+    kInPlace,  // if no bytes move, because the file contains offsets
     kAlways,
 };
 

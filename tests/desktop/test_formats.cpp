@@ -86,7 +86,7 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
         {"six.flac", "six.wav"},
         {"golden/late.flac", "golden/plain.flac"},
         {"golden/variable.flac", "golden/plain.flac", 0, 1408},
-        // The frame with the encoder's table is skipped.
+        // The first frame, which contains the encoder's Xing table, is skipped.
         {"vbr.mp3", "vbr_no_table.mp3"},
         // The container and its other streams do not change the samples.
         {"golden/program.aac", "golden/plain.aac"},
@@ -98,7 +98,7 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
         {"video.mp4", "low.aac"},
         {"video.ogv", "song.ogg"},
         {"layer3.mp4", "mono.mp3"},
-        // Vorbis is cut at its granule positions.
+        // A Vorbis stream is trimmed at the start and the end as its granule positions state.
         {"golden/late.ogg", "golden/plain.ogg"},
         {"golden/front.ogg", "golden/plain.ogg", 700},
         {"golden/end.ogg", "golden/plain.ogg", 0, 700},
@@ -132,8 +132,8 @@ samples mix_with_ffmpeg(const std::string &song, const std::string &channels) {
     return out;
 }
 
-// The songs are so long that the reader replaces its decoder several times. They have no noise
-// substitution. One exceeds full scale. One has blocks that are larger than the source's buffers.
+// The songs are long enough for the reader to replace its decoder several times. None uses noise
+// substitution. One song exceeds full scale. Another has blocks larger than the source's buffers.
 TEST(Reader, AgreesWithFfmpeg) {
     const struct {
         const char *file, *reference, *channels;

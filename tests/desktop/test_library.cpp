@@ -1,4 +1,4 @@
-// Tests that libwexaaudio.so loads libwexaaudio_av.so on demand, and that its readers share scans.
+// Tests that libwexaaudio.so loads libwexaaudio_av.so on demand and that readers share scans.
 #include <dlfcn.h>
 
 #include <cstdlib>

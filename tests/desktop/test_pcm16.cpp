@@ -14,7 +14,7 @@ int16_t convert(float sample) {
     return static_cast<int16_t>(std::lrint(std::clamp(sample * 32768.0f, -32768.0f, 32767.0f)));
 }
 
-// The input includes infinities, NaN and all values halfway between two integers.
+// The input includes infinities, NaN and all values halfway between two 16-bit samples.
 TEST(Pcm16, EqualsRoundingOneByOne) {
     constexpr uint64_t kStep = 9973;
     std::vector<float> left;

@@ -15,7 +15,7 @@ samples make_samples(size_t count) {
     return pcm;
 }
 
-// Returns the file with a little-endian number of `size` bytes at offset `at`.
+// Returns the file with a little-endian number of `size` bytes written at offset `at`.
 std::string patch(std::string file, size_t at, uint64_t value, size_t size = 2) {
     return file.replace(at, size, reinterpret_cast<const char *>(&value), size);
 }
@@ -28,7 +28,7 @@ TEST(Wav, ReadsUnusualHeaders) {
     const std::string extension = "\26\0\20\0\0\0\0\0\1\0\0\0\0\0\20\0\x80\0\0\xAA\0\x38\x9B\x71"s;
     const std::string plain = file.substr(0, kData);
     const std::string format = patch(patch(plain, kFormat + 8, 0xFFFE), kFormat + 4, 40);
-    // In these chunks, a reader that ignores the padding of an odd chunk finds a false data chunk.
+    // A reader that ignores the padding after an odd chunk finds a false data chunk in these.
     const std::string odd = "LIST\15\0\0\0INFOdata\1\0\0\0\7\0JUNK\5\0\0\0ddddd\0"s;
     const struct {
         const char *name;
@@ -61,8 +61,8 @@ TEST(Wav, ReadsUnusualHeaders) {
     }
 }
 
-// These sparse files are so large that offsets exceed 31 or 32 bits. In the last second all samples
-// are 1000. If the size of the data exceeds 32 bits, the header states 0xFFFFFFFF.
+// Offsets in these sparse files exceed 31 or 32 bits. All samples of the last second are 1000. If
+// the size of the data exceeds 32 bits, the header states 0xFFFFFFFF.
 TEST(Wav, ReadsTheEndOfLargeFiles) {
     constexpr int64_t kRate = 48'000, kSecondBytes = kRate * 8 * 2;
     const std::string last = support::wav_bytes(samples(kRate * 8, 1000), kRate, 8);

@@ -22,10 +22,10 @@ namespace {
 constexpr unsigned kMaxSeconds = 30;  // of one job
 constexpr long kMaxMib = 256;
 constexpr int64_t kFrame = 8192;  // samples
-// Tries about kCalls calls per value, and every kStep-th fault (all if TAVO_FAULTS is set).
+// About kCalls calls per value get faults. Every kStep-th fault runs (all if TAVO_FAULTS is set).
 constexpr int kCalls = 2, kStep = 31;
 
-// Returns wrong values: some near the limits of the named value, and some for every value.
+// Returns wrong values: some near the limits of the named value, and some used for every value.
 std::vector<int64_t> replacements_for(const std::string &value) {
     static std::map<std::string, std::vector<int64_t>> near_limits = {
         {"bytes", {16'384, 16'385, 131'071, 1'048'576, 1'048'577}},

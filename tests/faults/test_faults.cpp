@@ -102,7 +102,7 @@ const char *find_broken_promise(const outcome &found, int mode, const group &kin
     return in_song ? job::find_inconsistency(a, mode) : "beats outside the song";
 }
 
-// Makes about `count` evenly spread calls fail in turn, each alone, then with all later ones.
+// Makes about `count` evenly spread calls fail in turn, each first alone, then with all later ones.
 void try_calls(const std::string &path, int mode, const group &kind, int64_t count) {
     fault::plan plan = {kind.calls, INT64_MAX, false, kind.error};
     const outcome undisturbed = run(path, mode, plan);

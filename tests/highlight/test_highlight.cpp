@@ -154,7 +154,7 @@ TEST(Valleys, AreTheEndsOfQuietStretches) {
 }
 
 // Edges are steep rises. Those in the first 18 s and the last 50 s of a song are ignored. In a song
-// shorter than 90 s, those in the last 20 s are ignored.
+// shorter than 90 s, only those in the last 20 s are ignored.
 TEST(Search, ReturnsTheBestEdge) {
     const struct {
         const char *curve;
@@ -177,8 +177,8 @@ TEST(Search, ReturnsTheBestEdge) {
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 89, 8000},
         // The only edge is inside a passage, so the result is the edge itself.
         {"6 0.75 24 1 11 0.25 1 0.5 1 0.75 8 0.875 9 0.25", 80, 10000},
-        // The edge of the first row is as late as possible. That of the second row is too late. In
-        // the third row an earlier edge is chosen.
+        // The edge in the first row is as late as allowed. The edge in the second row is too late.
+        // In the third row, an earlier edge is chosen.
         {"36 0.25 10 1 14 0.25", 90, 70000},
         {"37 0.25 10 1 13 0.25", 90, 74000},
         {"20 0.25 1 0.9 14 0.25 1 1 24 0.25", 90, 40000},

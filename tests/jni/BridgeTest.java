@@ -35,7 +35,7 @@ public final class BridgeTest {
         }
     }
 
-    /** Records the event of an analysis. Inside the event, deinit is called and fails, then an exception is thrown. */
+    /** Records the event of an analysis. Each method calls deinit, which fails, and then throws an exception. */
     private static final class Recorder implements TavoListener {
         final CountDownLatch posted = new CountDownLatch(1);
         volatile String events = "";  // one result of deinit per event
@@ -57,7 +57,7 @@ public final class BridgeTest {
         }
     }
 
-    /** Runs one analysis to its event, or stops it immediately. */
+    /** Runs one analysis and waits for its event, or stops it immediately. */
     private static Recorder analyze(String path, int mode, boolean stop) throws Exception {
         Recorder recorder = new Recorder();
         Tavo tavo = new Tavo(recorder);

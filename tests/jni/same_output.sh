@@ -11,7 +11,7 @@ for options in '--mode highlight --length 10' '--mode beats --max-beats 8' '--mo
   printf '%s\n%s\n' "$options" "$native" | grep '[0-9]:[0-9]'
   [ "$native" = "$("$@" $options "$song")" ]
 done
-# The exit status is 1 for a file that cannot be analysed and 2 for wrong usage. Nothing is printed.
+# The exit status is 1 for a file that cannot be analysed and 2 for wrong usage. The standard output is empty.
 # shellcheck disable=SC2086
 for wrong in '1 /nowhere/song.wav' '2 --mode loud song.wav'; do
   status=0

@@ -67,7 +67,7 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     EXPECT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), -1);
     ASSERT_EQ(JNI_OnLoad(&fake_vm::machine, nullptr), 0x10006);
 
-    // Three callbacks before init: without a class, without the class's method, and with both.
+    // Of three callbacks, the first finds no class, the second no method, and the third finds both.
     call_back_on_a_thread(info);
     EXPECT_EQ(machine_state.log_lines, kNotAttached + kNotNotified);
     machine_state = {"GetStaticMethodID"};
@@ -81,7 +81,7 @@ TEST(JniFirstCalls, EachCreatesWhatItNeeds) {
     EXPECT_EQ(machine_state.log_lines, kNotNotified + kNoInstance);
     EXPECT_EQ(tavo_jni_mutex, nullptr);
 
-    // init uses an existing lock: it reads the path without the lock and releases the path with it.
+    // init locks an existing lock after it reads the path, and frees the path before it unlocks.
     pthread_mutex_t existing_lock = PTHREAD_MUTEX_INITIALIZER;
     tavo_jni_mutex = &existing_lock;
     std::vector<int> trials;

@@ -80,7 +80,7 @@ struct SourceTest : testing::Test {
             test(row);
         }
     }
-    // These functions return the code of the open.
+    // These functions return the result code of mtsrc_init.
     int32_t open_path(const std::string &path) {
         close_source();
         fake_codec::state.calls.clear();

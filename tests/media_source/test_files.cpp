@@ -37,7 +37,7 @@ TEST(FileIo, CallbacksReadWriteAndSeek) {
     EXPECT_TRUE(mtsrc_file_tell(file, &value) == 0 && value == 8);
     EXPECT_EQ(mtsrc_file_close(file), 0);
 
-    // A read does not wait for the rest of its bytes, which a pipe may never deliver.
+    // A short read returns at once, because a pipe may never deliver the rest of the bytes.
     int ends[2];
     EXPECT_TRUE(pipe(ends) == 0 && write(ends[1], "123456", 6) == 6);
     mtsrc_file handle = {ends[0]};
@@ -69,7 +69,7 @@ int32_t type_of(std::string content, decltype(mtsrc_io::seek) seek = mtsrc_file_
     return code == 0 ? type : code;
 }
 
-// An ID3v2.3 tag with a body of zeros.
+// Returns an ID3v2.3 tag whose body consists of `body` zeros.
 std::string id3(int32_t body) {
     std::string tag = "ID3\3\0\0"s;
     for (const int shift : {21, 14, 7, 0}) tag += static_cast<char>(body >> shift & 0x7F);
@@ -145,8 +145,8 @@ TEST(ProbeMpeg, FindsTwoHeadersOneFrameLengthApart) {
     }
 }
 
-// The first three headers have no known frame length (free format, Layers I and II of MPEG-2.5) and
-// are accepted only as a second header. The others have an invalid field or no sync word.
+// The frame length of the first three headers (free format, MPEG-2.5 Layers II and I) is unknown,
+// so they are accepted only as a second header. The others have an invalid field or no sync word.
 TEST(ProbeMpeg, InvalidHeadersAreRejected) {
     const std::pair<const char *, int32_t> cases[] = {
         {"\xFF\xFB\x01", 305},  {"\xFF\xE5\x90", 304},  {"\xFF\xE7\x90", 303},
@@ -162,7 +162,7 @@ TEST(ProbeMpeg, ScanContinuesAfterARejectedCandidate) {
     // Two candidates overlap. The first, at 0, has no second header; the other, at 1, has one.
     const std::string overlap = put("\xFF\xFF\xE2\x10", 53, "\xFF\xE2\x10\0"s) + zeros(600);
     expect_type(305, {"\xFF\xFB\x90" + kLayer3Pair, overlap});
-    // A pair is found only if its second header starts more than four bytes before 32 KiB.
+    // A pair is found only if its second header starts more than four bytes before the limit.
     const std::string late = put(zeros(kScanBytes), 32500, pair("\xFF\xFF\x10", 32));
     expect_type(305, {put(zeros(kScanBytes), 32763 - 417, kLayer3Pair)});
     expect_type(303, {late});

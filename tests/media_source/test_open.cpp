@@ -21,7 +21,7 @@ TEST_F(OpenClose, OpenCallsTheCodecLibraryInOrder) {
         EXPECT_TRUE(format.sample_rate == 22050 && format.duration == 123'456'789'012);
         EXPECT_TRUE(format.channels == (row.channels ? row.channels : 5) && format.bits == 16);
         EXPECT_EQ(bytes_of(format).substr(12, 4), "\xAB\xAB\xAB\xAB");
-        // The reader receives the handle's callbacks and zeroed records, the decoder its settings.
+        // The reader gets the handle's callbacks and zeroed records. The decoder gets its settings.
         const std::vector<fake_codec::call> created = fake_codec::calls_of("_create");
         const std::string zeroed = created[0].records[1] + created[0].records[2];
         EXPECT_TRUE(created[0].addresses[0] == &src->io && zeroed == zeros(zeroed.size()));
@@ -63,7 +63,7 @@ TEST_F(OpenClose, UnsupportedRatesAndChannelsAreRefused) {
                 << rate << " Hz, " << channels << " channels";
         }
     });
-    // Unsupported WAV formats. In the last row the record is empty and there is no reader.
+    // These WAV formats are unsupported. The last row has an empty record and no reader.
     const int32_t waves[][3] = {{3, 16, 0}, {kWexaPcm, 8, 0}, {kWexaPcm, 24, 0}, {0, 0, -1}};
     for (const auto &[codec, bits, created] : waves) {
         fake_codec::state.results["xwavd_create"] = {created};

@@ -8,7 +8,7 @@ using frames = std::vector<fake_codec::frame>;
 
 constexpr int32_t kAll = 900'000;  // bytes; less than the queue's size
 
-// Returns a frame of one stereo pair. Its start is not 0, so it is not the first of its stream.
+// Returns a frame of one stereo pair. As its start is not 0, it does not count as the first frame.
 fake_codec::frame pair_frame(int16_t value, int32_t decode_result = 0, int32_t produced = 1) {
     return {{value, value}, 1000 + value, 0, decode_result, produced};
 }
@@ -31,7 +31,7 @@ fake_codec::frame with_decoded_bytes(int32_t bytes) {
     return frame;
 }
 
-// Returns the samples that a source delivers for pair frames: one per frame, two in Ogg.
+// Returns the samples that a source delivers for pair frames: one per frame, or two in Ogg.
 samples expected_of(const source_row &row, const samples &values) {
     samples out;
     for (const int16_t value : values) out.insert(out.end(), row.codec == 323 ? 2 : 1, value);
@@ -72,8 +72,8 @@ TEST_F(Reading, FramesAreDecodedIntoTheQueue) {
     });
 }
 
-// A frame that cannot be decoded is skipped, and the decoder is reset. A second one in a row, an
-// unreadable one or an impossible byte count makes the read fail. The next read delivers the rest.
+// An undecodable frame is skipped, and the decoder is reset. If the next frame is undecodable too,
+// or a frame is unreadable or has an impossible size, the read fails. The next read then succeeds.
 TEST_F(Reading, OneUndecodableFrameIsSkipped) {
     for_each_row([&](const source_row &row) {
         const int32_t too_many = 1'048'575 + (row.codec == 322 ? 131'070 : 0);

@@ -24,7 +24,7 @@ class Installed(unittest.TestCase):
     @classmethod
     def setUpClass(cls):
         cls.folder = pathlib.Path(cls.enterClassContext(tempfile.TemporaryDirectory()))
-        # The folder is moved afterwards, because nothing may depend on its first path.
+        # The folder is then moved, because nothing may depend on its original path.
         run(CMAKE, "--install", BUILD, "--prefix", cls.folder / "first place")
         cls.prefix = (cls.folder / "first place").rename(cls.folder / "prefix")
         cls.lib = cls.prefix / LIBDIR

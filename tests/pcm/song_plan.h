@@ -93,7 +93,7 @@ class song_plan : public testing::Test {
         EXPECT_TRUE(fake_codec::state.objects.empty());
         EXPECT_TRUE(fake_codec::state.misuses.empty());
     }
-    // Plans the decoding and returns the code. Each source delivers `stream` from its segment on.
+    // Plans the decoding and returns the code. Each source starts at its segment in `stream`.
     int32_t plan(int64_t duration, int32_t rate, const std::string &stream = {}) {
         release();
         std::ofstream(file.path) << head;

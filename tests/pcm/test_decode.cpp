@@ -81,7 +81,7 @@ TEST_F(DecodePlan, ClosesEverySource) {
         std::deque<int32_t> &results = fake_codec::state.results["xflac_init"];
         results.assign(good, 0);
         results.push_back(1);
-        // The code is -4 if the first source cannot be opened, for later ones that of the open.
+        // If the first source cannot be opened, the code is -4. For others it is the open's code.
         EXPECT_EQ(plan(kTenSeconds, kRate), good == 0 ? -4 : -255) << good;
         EXPECT_TRUE(ctx.seg == nullptr && fake_codec::state.objects.empty());
     }
@@ -94,7 +94,7 @@ TEST_F(DecodePlan, ClosesEverySource) {
     }
 }
 
-// Ten seconds at 8000 Hz in four segments of 2.5 s.
+// A fixture for a stream of 10 s at 8000 Hz, decoded in four segments of 2.5 s.
 class Decode : public song_plan {
  protected:
     // Plans the decoding of the first `end` bytes of the stream.

@@ -37,7 +37,7 @@ TEST(ResampleBlock, AveragesBlocks) {
     EXPECT_EQ(average(33075, 11025, 0, 2, {1, 0, 0, 32767, 32767, 32766}),
               (signal_run{0.3333333432674407958984375, 32766.666015625}));
     const sample_run in = {10, 20, 30, 40, 50};
-    // A block that extends past the end is cut. One that starts past it uses the last sample.
+    // A block that extends past the end is cut. A block past the end uses the last sample.
     EXPECT_EQ(average(2, 1, 0, 4, in), (signal_run{15, 35, 50, 50}));
     // An empty block, here every other one, uses the sample at its start.
     EXPECT_EQ(average(1, 2, 0, 5, in), (signal_run{10, 10, 20, 20, 30}));
@@ -50,7 +50,7 @@ TEST(ResampleBlock, AveragesBlocks) {
               (signal_run{1.66666662693023681640625, 3.5, 6}));
 }
 
-// The expected values were computed separately. The tolerance is for the last bit of the sine.
+// The expected values were computed separately. The last bit of the sine may differ.
 TEST(ResampleSinc, TableHoldsTheWindowedSinc) {
     for (const auto &[rate, phase, tap, want] : {std::tuple{48000, 0, 9, 0.20671874284744263},
                                                  {48000, 240, 0, -5.7826164265861735e-6},
@@ -112,7 +112,7 @@ TEST(ResampleSinc, RefusesBadArgumentsAndPhases) {
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), 100, nullptr), -1);
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), -1, out.data()), 0);
     EXPECT_EQ(filter(prepare(-48000), in).back(), -1);
-    // A phase of 1/2 is still valid. With a ratio of 1.125 the sixth output has a phase of 5/8.
+    // A phase of 1/2 is valid. With a ratio of 1.125 the sixth output has an invalid one of 5/8.
     auto drifting = three_taps(0, 1, 0, 1.5f);
     drifting->coef[960][1] = 5.0f;
     EXPECT_EQ(filter(drifting, in)[1], 5);

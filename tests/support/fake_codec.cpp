@@ -186,7 +186,7 @@ void *create_demuxer(info *record, int32_t *count) {
     return create_reader(record);
 }
 
-// These functions fill the information record of a stream, whatever its type.
+// These functions fill information records of any type.
 template <typename info>
 void report_rate(info *record) {
     record->sample_rate = replace("rate", state.streams.back().sample_rate);
@@ -223,7 +223,7 @@ bool tags_are_empty() {
 
 using namespace fake_codec;
 
-// Macros define the functions that have the same signature.
+// These macros define functions that have the same signature in several parts of the library.
 #define FAKE_READ(function)                                                                 \
     int32_t function(void *reader, void *buf, int32_t size, int32_t *bytes, int64_t *first, \
                      int64_t *second) {                                                     \

@@ -90,7 +90,7 @@ struct library_state {
     std::vector<std::string> misuses = {};  // wrong objects, double deletions, short buffers
     replacement replace = nullptr;
 };
-// Each test starts with state = {}, when no object exists.
+// Each test must start with state = {}, assigned while no object exists.
 inline library_state state;
 
 template <typename record>

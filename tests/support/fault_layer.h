@@ -1,5 +1,5 @@
 // Makes calls to memory, thread, lock and file functions fail, on any thread. The program must link
-// the library's objects, because calls in libtavo.so do not fail.
+// the library's objects, because the linker cannot replace the calls in libtavo.so.
 #ifndef TAVO_TESTS_SUPPORT_FAULT_LAYER_H
 #define TAVO_TESTS_SUPPORT_FAULT_LAYER_H
 
@@ -34,7 +34,7 @@ struct plan {
     void (*on_call)() = nullptr;  // called before each counted call
 };
 
-// Starts counting calls and making them fail as planned. No other library thread may be running.
+// Starts counting calls and making them fail as planned. No library thread may be running.
 void arm(const plan &next);
 inline void disarm() {
     arm({});

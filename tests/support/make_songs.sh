@@ -86,8 +86,8 @@ convert song.aac song.m4a -c:a copy -bsf:a aac_adtstoasc
 oggenc --quiet -q 6 -s 1 -o song.ogg song.wav
 
 # A job decodes "brief" in one segment, the others in four. The highlight of "long" is not at its
-# start. "many" has more frames than the initial capacity of a frame index. WAV and MP3 files have
-# 11025 Hz, which is resampled with block averages. The others have 8000 Hz, which is interpolated.
+# start. "many" has more frames than the initial capacity of a frame index. WAV and MP3 files are at
+# 11025 Hz and resampled with block averages. The other files are at 8000 Hz and interpolated.
 cd "$out/short"
 while read -r name seconds loud_at; do
   "$make_song" "$name.wav" --seconds "$seconds" --loud-at "$loud_at" --channels 1 --rate 11025

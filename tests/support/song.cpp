@@ -24,8 +24,8 @@ constexpr double kAccent = 1.35;
 constexpr double kSwellSeconds = 4.0;
 constexpr double kSwell = 0.15;
 constexpr double kFadeSeconds = 0.01;  // duration of each change of the bed's gain
-// Each chord consists of the second, third and fourth harmonic of its root, so the bed's spectrum
-// does not change.
+// Each chord consists of the second, third and fourth harmonics of its root, so the bed's spectrum
+// keeps its shape.
 constexpr double kRootHz[4] = {110.0, 123.47, 98.0, 130.81};
 
 // A xorshift generator of numbers from -1 to 1. The state is never 0.
@@ -65,7 +65,7 @@ double faded_bed_gain_at(const song_spec &plan, double t) {
     return sum / 4.0;
 }
 
-// Adds the bed. Saturation gives it the ratio of loudness to peak that recorded music has.
+// Adds the bed. Saturation gives the bed the loudness-to-peak ratio of recorded music.
 void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     noise random = seeded(plan.seed, 100U);
     double phase = random.next() * kTwoPi;
@@ -75,7 +75,7 @@ void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     const double chord_seconds = kChordBeats * 60.0 / plan.bpm;
     for (size_t i = 0; i < out.size(); ++i) {
         const double t = static_cast<double>(i) / plan.rate;
-        // Chords change together with a hit. One added cycle of chords keeps the index positive.
+        // Chords change on a hit. Adding a cycle of four chords keeps the index positive.
         const double chord = (t - kFirstHit) / chord_seconds + 4.0;
         phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / plan.rate;
         const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
