@@ -43,7 +43,7 @@ int named_descriptor(const std::string &path) {
     return -1;
 }
 
-// True for a pipe or socket that the command inherited. The command's own are close-on-exec.
+// True for a pipe or socket that the command inherited. The command's own pipes are close-on-exec.
 bool is_inherited_pipe(int fd) {
     struct stat info {};
     return fd >= 0 && fstat(fd, &info) == 0 && (S_ISFIFO(info.st_mode) || S_ISSOCK(info.st_mode)) &&

@@ -20,7 +20,7 @@ std::string report_page_path(const options &opts, uint64_t index, const std::str
 // Checks that a page can be written. A page never replaces a song or a device.
 failure check_report(const std::string &target, bool force);
 
-// Reads the sound of the song, writes its page and stores its index row in `row`. Fails if stop_fd
+// Reads the song's sound, writes its page and stores its index row in `row`. Fails if stop_fd
 // becomes readable, which requests a stop.
 failure write_report_page(const record &result, const options &opts, const std::string &target,
                           int stop_fd, std::string &row);

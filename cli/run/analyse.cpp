@@ -25,7 +25,7 @@ constexpr int64_t kMsPerMinute = 60'000;
 // any rise of 3 dB is large enough for the library to refine the highlight.
 constexpr double kRaisedPower = 0.1585;
 
-// Reports the end of a job to the waiting thread. Set on the job's thread.
+// Reports the end of a job to the waiting thread. Set by the job's thread.
 struct job_end {
     std::atomic<const TAVO_INFO *> result{nullptr};
     int fd = -1;  // eventfd that wakes the waiting thread
@@ -76,7 +76,7 @@ void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, const song_file &so
     out.beats_ms.assign(info->beat_times, info->beat_times + info->beat_count);
 }
 
-// Runs the job of an instance and releases the instance.
+// Runs an instance's job and releases the instance.
 void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, const song_file &song, record &out) {
     job_end end;
     end.fd = eventfd(0, EFD_CLOEXEC);

@@ -1,4 +1,4 @@
-// Analyses one file: creates an instance of the library, runs its job and releases it.
+// Analyses one file: creates a library instance, runs its job and releases the instance.
 //
 // Input: a path and options. Output: a record. Follows input/song_file.h; precedes write/format.h.
 // Runs in a worker process, which has at most one instance at a time.

@@ -1,7 +1,7 @@
 // Starts, feeds, stops and reaps the worker processes. The library allows one instance per process,
 // so several files at once need several workers. A crash affects only one file.
 //
-// The command and a worker are connected by a pair of sockets. When the command closes its end for
+// The command and a worker are connected by a socket pair. When the command closes its end for
 // writing, the worker stops its analysis and ends. When a worker ends, the command reads
 // end-of-file from it. The command is single-threaded, so that it can fork at any moment.
 #ifndef TAVO_CLI_RUN_PROCESS_POOL_H

@@ -4,7 +4,7 @@
 #define TAVO_CLI_RUN_STOP_H
 
 // Installs the handlers. Ignores SIGPIPE and SIGXFSZ, so that a failed write returns an error
-// instead. Returns false with errno if the system refuses.
+// instead. Returns false and sets errno on failure.
 bool watch_for_stop();
 
 // Ignores the stop signals in a worker process, which ends when its socket is closed.

@@ -67,7 +67,7 @@ bool has_content(const std::string &path, const std::string &content) {
 failure write_markers(record &result, const options &opts) {
     const std::string target = marker_path(result.file, opts);
     const std::string content = marker_content(result, opts);
-    // A command that was killed before it committed the row may have left the file.
+    // An earlier command may have left the file, if it was killed before it committed the row.
     if (!is_stored(opts) || !has_content(target, content)) {
         if (failure failed = write_file(target, content, opts.force)) return failed;
     }
@@ -195,7 +195,7 @@ int serve_requests(int fd, const options &opts) {
     }
 }
 
-// An encoded message is a CBOR object, preceded by its size in bytes. Its texts may contain any
+// An encoded message is a CBOR object, preceded by its size in bytes. Its strings may contain any
 // bytes, because neither side checks that they are UTF-8.
 
 template <typename record_type>

@@ -12,7 +12,7 @@
 
 #include "cli/failure.h"
 
-// Null, text in UTF-8, a number as text, or the bytes of a path.
+// The value of a column: null, UTF-8 text, a number as text, or the bytes of a path.
 using cell = std::optional<std::string>;
 using row = std::vector<cell>;
 using row_reader = std::function<void(const row &)>;  // may be null

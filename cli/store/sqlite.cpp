@@ -33,7 +33,7 @@ int connect(const std::string &name, int flags, database &db) {
         return sqlite3_exec(opened, "SELECT count(*) FROM sqlite_master", nullptr, nullptr,
                             nullptr);
     }
-    // With a write-ahead log others can read during a write, and a kill at any moment does no
+    // With a write-ahead log, other processes can read during a write, and a killed writer does no
     // damage. If the file cannot be written, the first statement that changes it fails.
     sqlite3_exec(opened, "PRAGMA journal_mode=WAL; PRAGMA synchronous=NORMAL", nullptr, nullptr,
                  nullptr);

@@ -143,7 +143,7 @@ bool read_value(const std::string &text, column_type type, json &value) {
            std::all_of(value.begin(), value.end(), std::mem_fn(&json::is_number));
 }
 
-// Converts a row of page_query to a song. Its result lacks the name of the file.
+// Converts a row of page_query to a song. Its result lacks the file's name.
 stored_song song_of(const row &cells, int32_t mode) {
     stored_song song;
     song.path = cells[0].value_or("");
@@ -170,7 +170,7 @@ std::string public_text(const store &db, const failure &failed) {
     return shown(without_credentials(failed.sentence, db.opts.store));
 }
 
-// Connects and does the work. After a temporary failure both are repeated for at most --patience.
+// Connects and does the work. After a temporary failure, retries both for at most --patience.
 failure persist(store &db, const std::function<failure()> &work) {
     const auto start = steady_clock::now();
     for (int64_t wait_ms = kFirstWaitMs;; wait_ms = std::min(2 * wait_ms, kLongestWaitMs)) {

@@ -2,8 +2,8 @@
 // functions do nothing.
 //
 // Input: results as JSON (write/json.h). Output: one row for each song and set of parameters. A
-// batch of rows is one transaction, so a kill at any moment loses at most the open batch and leaves
-// no row half-written. Used by run/analyse_inputs.h, in the command's own process.
+// batch of rows is one transaction, so a command that is killed loses at most the open batch and
+// leaves no row half-written. Used by run/analyse_inputs.h, in the command's own process.
 #ifndef TAVO_CLI_STORE_STORE_H
 #define TAVO_CLI_STORE_STORE_H
 

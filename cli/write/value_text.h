@@ -8,7 +8,7 @@
 // Formats like printf and returns at most 95 characters.
 std::string formatted(const char *format, ...) __attribute__((format(printf, 1, 2)));
 
-// Convert a TAVO_MODE_* to its word (highlight, beats or both), and such a word to its mode.
+// Convert between a TAVO_MODE_* and its word: highlight, beats or both.
 const char *mode_word(int32_t mode);
 int32_t mode_of(const std::string &word);
 
