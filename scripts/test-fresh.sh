@@ -1,8 +1,8 @@
 #!/usr/bin/env bash
 # scripts/test-fresh.sh [COMMAND]...
 # For use before a release, as root; takes an hour or more. Creates a bare Debian 12 root, clones the last commit into
-# it under /root and runs the README's first commands, or the COMMANDs. Mounts nothing from this machine: /proc is a
-# new mount, and /dev contains a few new device nodes.
+# it under /root and runs the README's first commands, or the COMMANDs. Mounts nothing from this machine: /proc and
+# /dev/pts are new mounts, and /dev contains a few new device nodes.
 set -euo pipefail
 cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.."
 if [[ $(id -u) -ne 0 ]]; then
@@ -15,7 +15,9 @@ bash scripts/setup.sh package
 root=$(mktemp -d)
 log=$root.log
 remove_root() {
-  if mountpoint -q "$root/proc"; then umount "$root/proc" || true; fi
+  for folder in dev/pts proc; do
+    if mountpoint -q "$root/$folder"; then umount "$root/$folder" || true; fi
+  done
   if grep -qF " $root/" /proc/self/mountinfo; then
     echo "test-fresh: something is still mounted below $root; $root is not deleted" >&2
   else
@@ -40,7 +42,11 @@ random 1 8
 urandom 1 9
 tty 5 0
 END
-ln -s /proc/self/fd "$root/dev/fd"
+for link in fd:/proc/self/fd stdin:fd/0 stdout:fd/1 stderr:fd/2 ptmx:pts/ptmx; do
+  ln -s "${link#*:}" "$root/dev/${link%%:*}"
+done
+mkdir "$root/dev/pts"
+mount -t devpts -o newinstance,ptmxmode=0666 devpts "$root/dev/pts" # terminals of its own, for script(1)
 echo "127.0.0.1 localhost" >"$root/etc/hosts" # usually written by the installer
 
 git clone --quiet --no-hardlinks . "$root/root/tavo"
