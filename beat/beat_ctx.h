@@ -66,9 +66,9 @@ void fft2melmtx(int32_t sr, int32_t nfft, int32_t fmax, uint32_t nbands, float *
 // Divides the first `count` samples of `view` by its full scale and stores the results in `scaled`.
 void scale_samples(sample_view view, int64_t count, double *scaled);
 
-// Implements __beat_init. If with_signal is false, `signal` and rise_flags (12 bytes per sample)
-// stay null; jobs pass false, because they read `ana` directly. Returns false if the lock or any
-// other field cannot be allocated.
+// Implements __beat_init. If with_signal is false, `signal` and rise_flags stay null, which saves
+// 12 bytes per sample; jobs pass false because they read `ana` directly. Returns false if the lock
+// or any other field cannot be allocated.
 bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat);
 
 // Returns the length of the analysis signal in samples, or 0 if `ana` is null.

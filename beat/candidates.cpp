@@ -51,7 +51,7 @@ int32_t select_beats(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, const do
     return accepted;
 }
 
-// Writes the beat times (ms) to `out` and returns their number. `thr` (an entry per analysis frame
+// Writes the beat times (ms) to `out` and returns their number. `thr` (one entry per analysis frame
 // except the last) and peaks->frames must be zeroed.
 int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *thr,
                       PEAK_LIST *peaks, float *out) {
@@ -66,8 +66,8 @@ int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *
     peaks->count = found > 0 ? found : 0;
     std::copy(thr, thr + count, beat->threshold);
 
-    // Unlike qsort, std::sort does not allocate. If memory runs out, qsort falls back to an
-    // algorithm that reads out of bounds with a comparator that never reports equality.
+    // std::sort is used because it does not allocate. qsort does, and if memory runs out, it may
+    // read out of bounds with the comparators of dsp/sort.h, which never report equality.
     const int32_t accepted = select_beats(beat, peaks, thr, onset->max_beats, out);
     std::sort(peaks->frames, peaks->frames + peaks->count);
     std::sort(out, out + accepted);
@@ -77,8 +77,8 @@ int32_t compute_beats(TAVO_BEAT_CTX *beat, const TAVO_ONSET_CTX *onset, double *
     return total;
 }
 
-// Returns the capacity of the peak list: one entry per power rise and one per two analysis frames.
-// Peaks are never adjacent.
+// Returns the capacity of the peak list: one entry per power rise and one per two analysis frames,
+// because peaks are never adjacent.
 int64_t peak_capacity(const TAVO_BEAT_CTX *beat) {
     return (beat->frame_count > 0 ? beat->frame_count / 2 : 0) + beat->rise_count;
 }

@@ -12,7 +12,7 @@ extern "C" {
 int32_t getBeatCandi_MT(TAVO_BEAT_CTX *beat, TAVO_ONSET_CTX *onset, float *out);
 }
 
-// Returns an upper limit for the number of beats: peaks, power rises and beats added in gaps.
+// Returns an upper limit on the number of beats, which include those added in gaps.
 int64_t candidate_capacity(const TAVO_BEAT_CTX *beat);
 
 #endif

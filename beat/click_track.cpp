@@ -49,8 +49,8 @@ void make_blip(int32_t sr, int32_t length, float *blip) {
     }
 }
 
-// Returns the index of the sample nearest to a beat (ms). If the beat is past the end of the track,
-// returns `n`; if it is before the start, -1.
+// Returns the index of the sample nearest to a beat (ms). Returns `n` if the beat is past the end
+// of the track, or -1 if it is before the start.
 int64_t beat_sample(float beat, int32_t sr, int64_t n) {
     const float samples = beat * static_cast<float>(sr) / 1000.0f;
     const double nearest = static_cast<double>(samples) + 0.5;
@@ -118,8 +118,8 @@ void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, flo
     free(blip);
 }
 
-// Memory is allocated before the file is created so that a failure leaves no unfinished file. The
-// blips are generated after the file is created so that no time is lost if that fails.
+// Memory is allocated before the file is created so that running out of memory leaves no unfinished
+// file. The blips are generated afterwards so that no time is wasted if the file cannot be created.
 void write_click_track(const TAVO_CTX *ctx) {
     if (fnamedec == nullptr || fnamedec[0] == '\0') return;
     const int64_t n = analysis_length(ctx);

@@ -3,7 +3,7 @@
 namespace {
 
 constexpr int32_t kPerGap = 5;        // maximum number of beats added in one gap
-constexpr int32_t kEnoughAdded = 45;  // no gap is filled after more additions than this
+constexpr int32_t kEnoughAdded = 45;  // no gap is filled once more beats than this have been added
 constexpr float kLongGap = 6.0f;      // seconds; a gap this long is filled at any tempo
 constexpr float kSpansInGap = 3.0f;
 constexpr int32_t kTimeLead = 2;  // a beat's time is two hops after the start of its analysis frame

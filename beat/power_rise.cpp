@@ -38,8 +38,8 @@ double level_db(int32_t level) {
     return 20.0 * log10((level < kLevelFloor ? kLevelFloor : level) / kFullScale);
 }
 
-// For each of the `count` samples from `first` on, computes the sum of the ten squares around it.
-// Passes the sums to `use` in pairs. `count` must be even. The order of the additions is fixed.
+// Sums the squares of the ten samples around each of the `count` samples from `first` on. Passes
+// the sums to `use` in pairs. `count` must be even. The order of the additions is fixed.
 template <typename Use>
 void for_each_sum(sample_view view, int64_t first, int64_t count, Use use) {
     double squares[kChunk + 2 * kSumRadius] = {};
@@ -82,7 +82,7 @@ constexpr int64_t samples_to_decay(int32_t level, int32_t bottom) {
 constexpr int64_t kLongestDecay = samples_to_decay(kTopLevel, 0);
 static_assert(kLongestDecay < kBlock - kSumRadius);
 
-// Returns the decayed level at the end of block `b`, using the last `count` samples of the block.
+// Returns the decayed level at the end of block `b`, based on its last `count` samples.
 int32_t find_decayed_level(sample_view view, int64_t b, int64_t count) {
     int32_t decayed = 0;
     if (b < 1 || count < 1) return decayed;
@@ -94,7 +94,7 @@ int32_t find_decayed_level(sample_view view, int64_t b, int64_t count) {
     return decayed;
 }
 
-// Returns the level of the largest sum in block `b`. Ignores NaNs and decaying earlier peaks.
+// Returns the level of the largest sum in block `b`. Ignores NaNs and the decay of earlier peaks.
 int32_t largest_level(sample_view view, int64_t b) {
     const int64_t first = b == 1 ? kSumRadius : (b - 1) * kBlock + 1;
     double_pair most = {0.0, 0.0};
@@ -117,8 +117,8 @@ void measure_blocks(block_levels *blocks, int64_t n) {
 }
 
 // Of the samples (b - 1) * kBlock to b * kBlock, returns the first whose level reaches `target`, or
-// -1 if none does. `b` is at least 2. For the first and the last of these samples, the largest
-// level of their block counts instead of their own.
+// -1 if none does. `b` is at least 2. For the first and the last of these samples, uses the largest
+// level of their block instead of their own.
 int64_t find_sample(const block_levels *blocks, int64_t b, double target) {
     const int64_t start = (b - 1) * kBlock;
     if (blocks->db[b - 1] >= target) return start;

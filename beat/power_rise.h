@@ -14,8 +14,8 @@ extern "C" {
 int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n);
 }
 
-// Implements detectPowerVariation. *samples receives an array of the samples where rises start,
-// ascending; it may be null, and the caller always frees it. Returns the number of rises, or
+// Implements detectPowerVariation. Stores in *samples an array of the samples where rises start,
+// ascending, or null. The caller must always free it. Returns the number of rises, or
 // TAVO_ERR_MEMORY if memory runs out.
 int32_t find_power_rises(sample_view view, int64_t n, int64_t **samples);
 

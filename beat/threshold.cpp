@@ -63,7 +63,7 @@ void slide_window(TAVO_THRES_WORKER *worker, double *win) {
 }
 
 // Computes a worker's range of the threshold. If memory runs out, sets the record's `thr` to null
-// so that run_workers can report it.
+// so that run_workers can report the failure.
 void run_thres_worker(void *record) {
     auto *worker = static_cast<TAVO_THRES_WORKER *>(record);
     if (worker->first > worker->last || worker->window < 1) return;

@@ -19,9 +19,9 @@ uintptr_t page_size() {
 
 void advise_huge_pages(void *buffer, int64_t bytes) {
     if (buffer == nullptr || bytes < kLargeBytes) return;
-    // Extend the range to whole pages so that neighbouring buffers share huge pages and each
-    // buffer stays one mapping, which realloc can move. The advice does no harm to other data in
-    // the first and last page.
+    // Extend the range to whole pages. Otherwise the advice would split the buffer's mapping, so
+    // that realloc could not move it and neighbouring buffers could not share huge pages. Other
+    // data in the first and last page is not harmed.
     const uintptr_t page = page_size();
     const uintptr_t before = reinterpret_cast<uintptr_t>(buffer) % page;
     const uintptr_t pages = (before + static_cast<uintptr_t>(bytes) + page - 1) / page;

@@ -1,6 +1,6 @@
 // Creates, checks and releases instances.
 //
-// Input: a TAVO_PARAM. Output: a TAVO_CTX with its sub-contexts and a planned decoding. Follows
+// Input: a TAVO_PARAM. Output: a TAVO_CTX with its sub-contexts and a decoding plan. Follows
 // pcm/decode.h and precedes core/lifecycle.h.
 #ifndef TAVO_CORE_INSTANCE_H
 #define TAVO_CORE_INSTANCE_H
@@ -15,8 +15,8 @@ void clearTavoCtx(TAVO_CTX *ctx);
 }
 
 // Creates an instance in the ready state. The locks of core/lifecycle.h must exist. Returns the
-// instance, owned by the caller, with *err TAVO_OK. On failure, returns null, releases everything
-// and sets *err to TAVO_ERR_MEMORY or, if the decoding cannot be planned, to TAVO_ERR_HANDLE.
+// instance, which the caller owns, and sets *err to TAVO_OK. On failure, returns null, releases
+// everything and sets *err to TAVO_ERR_MEMORY or, if planning fails, to TAVO_ERR_HANDLE.
 TAVO_CTX *open_instance(const TAVO_PARAM *param, int32_t *err);
 
 // True if the handle is not null and has the mark of an instance.

@@ -37,8 +37,8 @@ void poll_until_ended(const TAVO_CTX *ctx) {
     while (!has_ended(ctx)) sched_yield();
 }
 
-// True inside the callback of the job that tavo_analyze started, where tavo_deinit would join its
-// own thread.
+// True inside the callback of a job that tavo_analyze started. There, tavo_deinit would have to
+// join the thread that is calling it.
 bool runs_job_of(const TAVO_CTX *ctx) {
     return pthread_equal(ctx->worker, pthread_self()) != 0;
 }

@@ -46,7 +46,7 @@ Record *collect_peaks(const Sample *x, int64_t len, int64_t count) {
 
 // Suppresses the positions within `radius` of `index`. Larger peaks in that range are already
 // suppressed: had one survived, it would have suppressed this peak. Survivors are more than
-// `radius` apart, so all calls together mark each position at most twice.
+// `radius` apart, so each position is marked at most twice in total.
 void suppress_around(uint8_t *marks, int64_t len, int64_t index, int64_t radius) {
     if (radius < 0) return;
     const int64_t begin = index > radius ? index - radius : 0;
@@ -83,8 +83,8 @@ void suppress_around_priorities(uint8_t *marks, int64_t len, int64_t radius) {
     }
 }
 
-// Same as findNearestIndex, but by binary search: a long song has thousands of targets and hundreds
-// of thousands of peaks. `list` must be strictly ascending, and `target` must not be negative.
+// Same as findNearestIndex, but uses binary search, because a long song has thousands of targets
+// and hundreds of thousands of peaks. `list` must be strictly ascending and `target` at least 0.
 int32_t search_nearest(const int32_t *list, int32_t target, int32_t n) {
     int32_t begin = 0;  // entries before begin are below target, entries from end on are not
     int32_t end = n;

@@ -25,12 +25,12 @@ extern "C" {
 int32_t findsortedNPeaks(const float *x, int64_t len, uint32_t min_dist, uint32_t max_count,
                          uint32_t *out);
 
-// If min_dist is 0, finds all peaks in ascending order. Otherwise, finds them largest first and
-// drops each one closer than min_dist to a larger one. Writes them to out[len / 2] and returns
-// how many it wrote.
+// If min_dist is 0, finds all peaks in index order. Otherwise, finds them largest first and drops
+// each one closer than min_dist to a larger one. Writes them to out[len / 2] and returns how many
+// it wrote.
 int32_t findPeaks(const double *x, int64_t len, uint32_t min_dist, int32_t *out);
 
-// For each priority position, first writes the nearest peak, unless that is the last one. Then
+// For each priority position, first writes the nearest peak, unless it is the last peak of x. Then
 // writes the other peaks, largest first, dropping each one closer than min_dist to a peak already
 // written. `out` has n_priority + len / 2 entries. Returns the number of peaks written, or -1 if
 // min_dist is 0.

@@ -52,7 +52,7 @@ int32_t partition(int32_t lo, int32_t hi, double *a) {
 }
 
 // Recursing only into the smaller part limits the depth to log2 of the length. The two parts are
-// independent, so the result does not depend on their order.
+// independent, so the result does not depend on which is sorted first.
 void quickSort(int32_t lo, int32_t hi, double *a) {
     while (lo < hi) {
         const int32_t middle = partition(lo, hi, a);

@@ -68,7 +68,7 @@ bool rank_curve(const float *power, int32_t n, float *largest, float *percentile
 }
 
 void find_segments(search_state *s) {
-    // Point 0 counts as quiet, so a song that is loud from the start has a segment there.
+    // Point 0 counts as quiet, so a song that is loud from the start has a segment at point 0.
     bool above = false;
     for (int32_t k = 0; k < s->n - 1 && s->nseg < kMaxSegments; ++k) {
         const bool next_above = s->norm[k + 1] > s->mean;
@@ -147,8 +147,8 @@ int32_t choose_edge(const search_state *s) {
     return scored != 0 ? scored : first_loud_edge(s);
 }
 
-// Returns the start of the first loud segment or the first valley, whichever comes first. This is
-// the highlight start if a region of the requested length that starts there reaches the song's end.
+// Returns the start of the first loud segment or the first valley, whichever comes first. The
+// highlight starts there if a region of the requested length would then reach the song's end.
 int32_t fallback_point(const search_state *s) {
     const int32_t start = s->nseg > 0 ? s->start[0] : 0;
     const int32_t valley = s->nv > 0 ? s->valley[0] : 0;

@@ -9,9 +9,9 @@ constexpr double kHopSeconds = 0.4;
 constexpr int64_t kSpanSeconds = 12;   // from the start of the first window to the end of the last
 constexpr int64_t kBeforeMs = 3000;    // the first window starts this long before the coarse start
 constexpr int64_t kMinAfterMs = 9000;  // audio required after the coarse start
-constexpr int64_t kEarliest = -999;  // lower limit in ms * Hz: less than one sample before the song
-constexpr int64_t kMaxFrames = 64;   // windows: 27 at the usual rates, at most 44 at any rate
-constexpr int64_t kRiseFrames = 5;   // windows averaged after the start of a rise
+constexpr int64_t kEarliest = -999;    // minimum of begin_ms * rate: less than one sample before 0
+constexpr int64_t kMaxFrames = 64;     // windows: 27 at the usual rates, at most 44 at any rate
+constexpr int64_t kRiseFrames = 5;     // windows averaged after the start of a rise
 constexpr float kMinRise = 0.13f;
 
 // Loudness windows around the coarse start.

@@ -134,7 +134,7 @@ typedef struct TAVO_STREAM {
 } TAVO_STREAM;
 
 /** Receives the result, once per job, on the job's worker thread. Must not call tavo_deinit,
- * which returns -4 there; another thread can. */
+ * which returns -4 there; another thread may. */
 typedef void (*TAVO_CALLBACK)(TAVO_INFO *info);
 
 /** Receives the result as TAVO_CALLBACK does, and the pointer that was passed to
@@ -166,10 +166,10 @@ const char *tavo_error_text(int32_t code);
  * Only one instance may exist in a process; the caller must ensure this. A second tavo_init
  * succeeds while the first instance exists, but both then share their locks and may wait forever.
  *
- * Returns the instance, owned by the caller until tavo_deinit, with *err 0. On failure returns
- * null, releases everything, and sets *err to -2 (out of memory) or -4 (the file cannot be used,
- * whatever the reason). tavo_probe with the same path returns the reason; if it returns 0, there
- * was too little memory. */
+ * Sets *err to 0 and returns the instance, which the caller owns until tavo_deinit. On failure
+ * returns null, releases everything, and sets *err to -2 (out of memory) or -4 (the file cannot be
+ * used, whatever the reason). tavo_probe with the same path returns the reason; if it returns 0,
+ * there was too little memory. */
 TAVO_CTX *tavo_init(const TAVO_PARAM *param, int32_t *err);
 
 /** Stores the callback. Call it before tavo_analyze. The handle is not checked. */
@@ -208,7 +208,7 @@ int32_t tavo_get_stream(const TAVO_CTX *ctx, int32_t *rate, int32_t *channels,
 int32_t tavo_get_tempo(const TAVO_CTX *ctx);
 
 /** Returns 1 if the job decoded any audio; call this function in the callback or later. Without
- * audio, a highlight at 0 is not a result. Returns 0 before the end of the job, if nothing was
+ * audio, a highlight at 0 has no meaning. Returns 0 before the end of the job, if nothing was
  * decoded, or for a bad handle. */
 int32_t tavo_has_audio(const TAVO_CTX *ctx);
 
@@ -240,10 +240,10 @@ typedef struct mtsrc_frame {
 } mtsrc_frame;
 
 /** Opens a file to read its samples, for instance to draw them; an analysis does not need this.
- * Returns a handle, which the caller releases with mtsrc_deinit, with *err 0. On failure returns
- * null and sets *err: -2 out of memory; -3 unknown or unsupported format, or path too long; -4 no
- * path; -6 file unreadable or shorter than 16 bytes; -7 file cannot be opened, or has no usable
- * audio; -255 the codec library failed. */
+ * Sets *err to 0 and returns a handle, which the caller releases with mtsrc_deinit. On failure,
+ * returns null and sets *err to -2 (out of memory), -3 (format unknown or unsupported, or path too
+ * long), -4 (no path), -6 (file unreadable or shorter than 16 bytes), -7 (file cannot be opened or
+ * has no usable audio) or -255 (codec library failed). */
 mtsrc_ctx *mtsrc_init(const mtsrc_param *param, int32_t *err);
 
 /** Delivers `want` bytes; any count up to 917,506 is allowed. Returns 0 if it delivered all of

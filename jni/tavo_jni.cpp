@@ -185,8 +185,8 @@ jint init_failed(jint code) {
     return code;
 }
 
-// Called with the lock held, or during an event while an instance is open. `chars` is the text of
-// `path` or null; this function releases it.
+// Implements init. Called with the lock held, or during an event while an instance is open. `chars`
+// is the text of `path` or null; this function releases it.
 jint init_locked(JNIEnv *env, jstring path, const char *chars, jint mode) {
     const bool is_open = load_pointer(&instance) != nullptr;
     int32_t err = TAVO_ERR_HANDLE;

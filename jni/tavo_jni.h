@@ -27,9 +27,9 @@ JNIEXPORT void JNICALL Java_com_kestu_tavo_Tavo_native_1setup(JNIEnv *env, jobje
                                                               jobject obj);
 
 // Opens a file. If an instance already exists, changes nothing and returns TAVO_ERR_BUSY, whatever
-// the path. Otherwise returns TAVO_OK, or an error after which no instance exists: TAVO_ERR_HANDLE
-// if the path is null, the file is unusable or the class lacks postEventFromNative; or
-// TAVO_ERR_MEMORY.
+// the path. Returns TAVO_OK on success. On any other failure, leaves no instance and returns
+// TAVO_ERR_MEMORY if memory runs out, or TAVO_ERR_HANDLE if the path is null, the file is unusable
+// or the class lacks postEventFromNative.
 JNIEXPORT jint JNICALL Java_com_kestu_tavo_Tavo_init(JNIEnv *env, jobject thiz, jstring path,
                                                      jint mode);
 

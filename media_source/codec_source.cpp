@@ -18,7 +18,7 @@ void *stream_of(const codec_source &source, const mtsrc_ctx *src) {
     return source.container->close_stream != nullptr ? src->dstream : src->demux;
 }
 
-// Checks a byte count from the codec library. It may be wrong: the library is a separate binary.
+// Checks a byte count from the codec library, a separate binary that may report a wrong count.
 bool is_possible(int32_t bytes, int32_t capacity) {
     return bytes >= 0 && bytes <= capacity;
 }

@@ -48,9 +48,9 @@ struct codec_source {
 // Returns the index of the first audio entry of kinds[count], or -1.
 int32_t codec_source_first_audio(const int32_t *kinds, int32_t count);
 
-// Two functions for codec_source.reduce. The first keeps the first channel. The second is for PCM
-// that already has one channel, and changes nothing.
+// For codec_source.reduce: keeps only the first channel.
 int32_t codec_source_reduce_to_first(const mtsrc_ctx *src, int32_t bytes, int64_t first);
+// For codec_source.reduce: changes nothing, because the PCM already has one channel.
 int32_t codec_source_reduce_none(const mtsrc_ctx *src, int32_t bytes, int64_t first);
 
 // Starts opening a source: calls `init`, then sets demux, dstream and decoder to null. `init` is a
@@ -68,8 +68,8 @@ int32_t codec_source_set_decoder(mtsrc_ctx *src, const codec_ops &codec, void *d
 int32_t codec_source_end_open(const codec_source &source, mtsrc_ctx *src, wexa_tags *tags,
                               int32_t code);
 
-// The operations of a source other than open. They accept a null handle; close also accepts a
-// handle whose open failed.
+// All operations of a source except open. They accept a null handle; close also accepts a handle
+// whose open failed.
 void codec_source_close(const codec_source &source, mtsrc_ctx *src);
 int32_t codec_source_get_frm(const codec_source &source, mtsrc_ctx *src, int32_t want,
                              mtsrc_frame *frame);

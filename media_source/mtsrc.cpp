@@ -20,7 +20,7 @@ mtsrc_ctx *new_handle(const mtsrc_io *io) {
     auto *src = static_cast<mtsrc_ctx *>(calloc(1, sizeof(mtsrc_ctx)));
     if (src == nullptr) return nullptr;
     src->q_cap = kQueueBytes;
-    // Zeroed, because the queue may count an incomplete last sample whose bytes are never written.
+    // The queue is zeroed, because it may count an incomplete last sample that is never written.
     src->q_base = static_cast<uint8_t *>(calloc(1, kQueueBytes + kQueueSpareBytes));
     if (src->q_base == nullptr || pthread_mutex_init(&src->lock, nullptr) != 0) {
         free(src->q_base);
@@ -108,7 +108,7 @@ mtsrc_ctx *mtsrc_open_mfal(const mtsrc_io *io, int64_t /*flags*/, int32_t *err) 
 
 int32_t mtsrc_getstream_format(mtsrc_ctx *src, mtsrc_format *fmt) {
     if (!is_open(src) || fmt == nullptr) return TAVO_ERR_HANDLE;
-    // Copied field by field to leave the padding after `bits` as the caller set it.
+    // Copy field by field so that the padding after `bits` stays unchanged.
     fmt->sample_rate = src->format.sample_rate;
     fmt->channels = src->format.channels;
     fmt->bits = src->format.bits;

@@ -1,7 +1,7 @@
 // The source handle. Only mtsrc.cpp and the format sources use its fields.
 //
-// mtsrc.cpp allocates the handle, recognises the file and calls its format source through the five
-// operations.
+// mtsrc.cpp allocates the handle, recognises the file and calls the format source through the
+// pointers open, close, get_frm, seek and reset.
 #ifndef TAVO_MEDIA_SOURCE_MTSRC_CTX_H
 #define TAVO_MEDIA_SOURCE_MTSRC_CTX_H
 
@@ -95,7 +95,7 @@ int32_t mtsource_ogg_seek(mtsrc_ctx *src, int64_t position, int64_t *reached);
 int32_t mtsource_ogg_reset(mtsrc_ctx *src);
 
 // Consumes the next compressed frame and returns the sample rate (Hz) that the decoder reports for
-// it; -1 on failure.
+// it, or -1 on failure.
 int32_t aac_get_hz(void *reader, void *decoder);
 
 // Return the index of the first audio track or stream, or -1. `info` is an xmp4_info or an

@@ -37,8 +37,8 @@ mtsrc_file *mtsrc_file_open(const mtsrc_io *io, int32_t mode) {
         free(file);
         return nullptr;
     }
-    // A duplicated descriptor shares its offset with the original. On a pipe this call fails, and
-    // recognition then fails too.
+    // A duplicated descriptor starts at the original's offset, which may not be 0. On a pipe this
+    // call fails, and recognition then fails too.
     lseek64(file->fd, 0, SEEK_SET);
     return file;
 }

@@ -22,10 +22,10 @@ void pcm_queue_clear(mtsrc_ctx *src);
 // Adds the bytes that the caller has written at q_wr, at most q_room.
 void pcm_queue_push(mtsrc_ctx *src, int32_t bytes);
 
-// Implements every get_frm: fills the queue until it holds `want` bytes, then delivers them.
-// Returns 0, kMtsrcEndOfStream after delivering what is left, TAVO_ERR_MEMORY if memory runs out,
-// TAVO_ERR_READ if no step adds anything, or a step's own code. Returns TAVO_ERR_HANDLE and keeps
-// all bytes queued if the frame record is bad, or `want` is negative or too large.
+// Implements every get_frm. Delivers `want` bytes and returns 0. At the end of the stream, delivers
+// what is left and returns kMtsrcEndOfStream. Returns TAVO_ERR_MEMORY if memory runs out,
+// TAVO_ERR_READ after too many empty steps, or the code of a failed step. If `frame` is bad, or if
+// `want` is negative or too large, returns TAVO_ERR_HANDLE and keeps all queued bytes.
 int32_t pcm_queue_get(mtsrc_ctx *src, int32_t want, mtsrc_frame *frame, const pcm_fill &fill);
 
 // Releases the memory of pages that hold no PCM. The pages stay allocated and read as zeros.

@@ -61,8 +61,8 @@ int32_t hertz(const frame_header &header) {
     return kRates[header.version][header.rate];
 }
 
-// Returns the length of a frame in bytes, without padding; 0 for Layers I and II of version 2.5,
-// which has only Layer III.
+// Returns the length of a frame in bytes, without padding. Returns 0 for Layers I and II of version
+// 2.5, which has only Layer III.
 int32_t frame_length(const frame_header &header) {
     const int32_t bits = 1000 * kilobits(header);
     switch (header.layer) {

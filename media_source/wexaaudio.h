@@ -23,8 +23,8 @@ constexpr int32_t kWexaKindAudio = 1;  // kind of an audio track or stream
 constexpr int32_t kWexaTagAac = 0xFF;  // WAVE format tags of MP4 tracks
 constexpr int32_t kWexaTagMpegLayer3 = 0x55;
 constexpr int32_t kWexaEndOfStream = 1;  // result of a read past the last frame
-// Sample pairs that the MPEG source drops at the start of a 44.1-kHz stereo stream. The durations
-// and positions of a reader do not include them.
+// Sample pairs that the MPEG source drops at the start of a 44.1-kHz stereo stream. A reader's
+// durations and positions do not include them.
 constexpr int32_t kWexaMpegDelay = 529;
 
 // The tags of a file. A library that reads no tags stores a null pointer instead. The library owns

@@ -4,7 +4,7 @@
 
 namespace {
 
-// Loads the first eight bytes, which rule out nearly every offset. The address may be odd.
+// Loads eight bytes from any address. Comparing a block's first eight rules out most offsets.
 uint64_t load_head(const uint8_t *bytes) {
     uint64_t head = 0;
     memcpy(&head, bytes, sizeof head);

@@ -44,9 +44,9 @@ extern pthread_mutex_t *ext_mutex_mt;
 extern pthread_cond_t *ext_cond_mt;
 
 // Plans the decoding of the file: fills fmt, duration, seg, seg_count, pcm and pcm_bytes. Returns
-// 0. On failure, releases everything and returns an error: TAVO_ERR_MEMORY; TAVO_ERR_FORMAT if the
-// stream is unusable, lasts 1 s or less, or has a rate below 8000 Hz; TAVO_ERR_HANDLE if the file
-// cannot be opened; or the code of a segment's source.
+// 0. On failure, releases everything. It then returns TAVO_ERR_HANDLE if the file cannot be opened,
+// TAVO_ERR_FORMAT if check_stream refuses the stream, TAVO_ERR_MEMORY if memory runs out, or the
+// code of mtsrc_init if a segment's source cannot be opened.
 int32_t tavo_decode_init(TAVO_CTX *ctx, const TAVO_PARAM *param);
 
 // Releases the segment table with its sources and buffers, the PCM buffer, the lock and the

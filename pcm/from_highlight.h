@@ -12,8 +12,8 @@
 extern "C" {
 
 // Computes the analysis signal from `pos` (milliseconds) on. Returns 0, or the error code of the
-// conversion. If the stream must be decoded again and that cannot be planned, returns
-// TAVO_ERR_MEMORY. Reads from the first segment's source, or from all sources to decode again.
+// conversion. If the stream must be decoded again but the decoding cannot be planned, returns
+// TAVO_ERR_MEMORY. Reads from the first segment's source; a second decoding reads from all sources.
 int32_t tavo_get_from_here(TAVO_CTX *ctx, int64_t pos);
 
 // Looks in `pcm` for the audio that the segment's source delivers next. On entry, *off is the byte

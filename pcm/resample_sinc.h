@@ -34,8 +34,8 @@ int32_t dorn_resampler_convert(const dorn_resampler_state *state, const int16_t 
 }
 
 // Same as dorn_resampler_convert, but writes at most max_frames output frames. On long inputs, the
-// single-precision position falls so far short of the exact one that the conversion would otherwise
-// write more than the rates allow.
+// single-precision position falls behind the exact one, so without this limit the conversion would
+// write more frames than the rates allow.
 int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int32_t in_len,
                        int16_t *out, int64_t max_frames);
 

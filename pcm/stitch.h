@@ -16,8 +16,8 @@ void stereo2mono(int16_t *dst, const int16_t *src, int32_t frames);
 }
 
 // Selects what happens to a segment's buffer once it is stitched. `kept` leaves the buffer
-// unchanged. `released` returns to the system the pages of a large buffer and the unused pages of
-// its source's queue. The buffer stays allocated and reads as zeros.
+// unchanged. `released` gives the pages of a large buffer back to the system, together with the
+// unused pages of its source's queue. The buffer stays allocated and reads as zeros.
 enum class segment_pages { kept, released };
 
 // Returns the number of bytes in one second of PCM. Every segment except the first drops its first
@@ -27,8 +27,8 @@ inline int64_t second_bytes(int32_t rate) {
 }
 
 // Copies the `count` decoded segments to `dst`, which has `capacity` bytes. Each segment is placed
-// where the output already contains the segment's first bytes, or otherwise at the end. Returns the
-// number of bytes written, or 0 if any segment is empty.
+// where its first bytes already occur in the output, or at the end if they do not occur. Returns
+// the number of bytes written, or 0 if any segment is empty.
 int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
                         int64_t capacity, segment_pages pages);
 

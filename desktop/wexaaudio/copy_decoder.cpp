@@ -14,7 +14,7 @@ struct copy_decoder {
     int32_t rate;  // configured sample rate, Hz; only for AAC
 };
 
-// Refuses any output_channels other than `channels`, which is what the codec's readers deliver.
+// Returns null if the configuration requests PCM in a form that the readers do not deliver.
 copy_decoder *create(const wexa_config *config, int32_t channels) {
     if (config->bytes_per_sample != kSampleBytes || config->output_channels != channels) {
         return nullptr;

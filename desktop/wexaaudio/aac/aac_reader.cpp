@@ -74,8 +74,8 @@ bool scan_frames(io_file *file, int64_t offset, frame_index *frames, adts_header
         if (header_at(file, end, &next) && same_stream(next, *first)) {
             offset = end;
         } else {
-            // The file is damaged. If the length is wrong, the next header may be inside this
-            // frame.
+            // The file ends or is damaged. If the length is wrong, the next header may be inside
+            // this frame.
             offset = find_frame(file, offset + h.head, first, &next);
             frame_entry &last = frames->entry[frames->count - 1];
             if (offset >= 0 && offset < end) {

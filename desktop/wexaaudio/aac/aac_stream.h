@@ -24,7 +24,7 @@ struct aac_config {
     bool short_frames;    // a frame has 960 samples instead of 1024
 };
 
-// Returns the sample rate in Hz for an index of the rate table; 0 for an invalid index.
+// Returns the sample rate in Hz for an index of the rate table, or 0 for an invalid index.
 int32_t aac_rate_of_index(int32_t index);
 
 // Builds a configuration from the fields of a header. `channels` is from 0 to 15.
@@ -38,9 +38,9 @@ bool aac_config_add_program(aac_config *config, const uint8_t *data, int32_t byt
 bool aac_config_read(aac_config *config, const void *data, int32_t bytes);
 
 // Completes a stream whose frames are in the index. Decodes the first frames to find the true rate
-// and channels, makes the configuration explicit, sets the length of all frames and chooses the
-// groups. A frame of impossible size becomes silence. Returns false if no frame decodes or memory
-// runs out.
+// and channels, adds any band replication to the configuration, sets the length of all frames and
+// chooses the groups. A frame of impossible size becomes silence. Returns false if no frame can be
+// decoded or memory runs out.
 bool aac_stream_complete(io_file *file, aac_config *config, stream_info *info);
 
 #endif

@@ -101,7 +101,7 @@ int32_t decode(av_decoder *d) {
     int result = avcodec_send_packet(d->ctx, d->packet);
     if (result == 0) result = avcodec_receive_frame(d->ctx, d->frame);
     if (result == AVERROR(EAGAIN)) return 0;
-    // A damaged packet may yield several frames. Discard all except the first so that they do not
+    // A damaged packet may yield several frames. Keep only the first so that the others do not
     // appear in the next packet's output.
     while (result == 0 && avcodec_receive_frame(d->ctx, d->spare) == 0) av_frame_unref(d->spare);
     if (result == 0 && is_audio(d->frame)) return d->frame->nb_samples;

@@ -184,13 +184,13 @@ table load(io_file *file, span body) {
     return t;
 }
 
-// Returns the number at an offset of the table; 0 past the end.
+// Returns the number at an offset in the table, or 0 past its end.
 int64_t value(const table &t, int64_t at, int32_t width) {
     const bool inside = at >= 0 && at + width <= t.bytes;
     return static_cast<int64_t>(big_endian(inside ? t.data + at : nullptr, width));
 }
 
-// The tables of a track: frames per chunk, offsets of the chunks, sizes of the frames.
+// A track's tables: the frames per chunk, the chunk offsets and the frame sizes.
 struct tables {
     table runs;    // "stsc": count; first chunk, frames in each, description (32 bits each)
     table chunks;  // "stco", "co64": count; offsets of chunk_width bytes

@@ -11,7 +11,7 @@ constexpr int32_t kVersion25 = 0;
 constexpr int32_t kModeMono = 3;
 constexpr int32_t kVbriAt = 36;  // bytes after the frame's start, for any size of side information
 
-// Sample rates of MPEG-1 in Hz. Those of MPEG-2 are half as high, those of MPEG-2.5 a quarter.
+// MPEG-1 sample rates in Hz. MPEG-2 rates are half of these, and MPEG-2.5 rates are a quarter.
 constexpr int32_t kRates[3] = {44100, 48000, 32000};
 
 // Bitrates in kbit/s, indexed by [0 for MPEG-1, 1 for others][layer - 1][bitrate index].
@@ -83,7 +83,7 @@ void mpeg_describe(const mpeg_header *head, stream_info *info) {
     info->channels = head->channels;
     info->out_channels = head->channels;
     // The filter bank's memory spans at most two frames (in Layer I and in Layer III of MPEG-2).
-    // The third is a cheap margin.
+    // The third frame is a cheap margin.
     info->preroll = 3;
     info->reservoir = head->layer == 3 ? kMpegMaxBackstep : 0;
     info->overhead = main_data_at(head);

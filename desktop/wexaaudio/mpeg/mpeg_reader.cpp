@@ -79,7 +79,7 @@ bool find_chain(mpeg_scan *s, mpeg_header *first) {
         int32_t got = 0;
         const uint8_t *p = io_file_peek(s->file, s->at, kLook, &got);
         if (p == nullptr || got < kMpegHeaderBytes) return false;
-        // Only the last block is searched to its end; in others a chain might be cut off there.
+        // Only the last block is searched to its end; other blocks may cut off a chain there.
         const int32_t sure = s->at + got >= s->end ? got : got - kLook + 1;
         int64_t tag = 0;
         int32_t i = 0;

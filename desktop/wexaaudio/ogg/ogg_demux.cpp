@@ -122,7 +122,7 @@ bool add_packet(ogg_scan *scan) {
 }
 
 // Applies the first granule position, which determines where the stream starts. Surplus audio is
-// cut off at the start; if the stream ends on this page, cut_end cuts it off at the end.
+// cut off at the start; if the stream ends on this page, cut_end cuts it off at the end instead.
 void apply_first_granule(ogg_scan *scan, int64_t granule, bool ends) {
     frame_index *packets = &scan->info->frames;
     const int64_t surplus = frame_index_end(packets) - granule;

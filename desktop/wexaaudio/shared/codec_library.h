@@ -23,21 +23,21 @@ struct codec_library {
     // runs out. The caller fills it before calling decode.
     uint8_t *(*packet)(av_decoder *decoder, int32_t bytes);
 
-    // Decodes the packet. Returns the number of sample frames in the output, which may be 0; -1 if
-    // the packet cannot be decoded; or kCodecNoMemory.
+    // Decodes the packet. Returns the number of sample frames in the output, which may be 0.
+    // Returns -1 if the packet cannot be decoded, or kCodecNoMemory.
     int32_t (*decode)(av_decoder *decoder);
 
     // Stores the sample rate in Hz and the channel count of the output; both are 0 without output.
     void (*format)(const av_decoder *decoder, int32_t *rate, int32_t *channels);
 
-    // Writes up to `count` sample frames of the output, starting at sample frame `skip`, as
-    // interleaved 16-bit PCM, rounded to nearest and clipped, without dither. Two channels are
-    // front left and right, or a single channel twice; one channel is the mean of all, rounded
-    // toward zero. Returns the number of sample frames written.
+    // Writes up to `count` sample frames of the output from sample frame `skip` on as interleaved
+    // 16-bit PCM, rounded to nearest and clipped, without dither. If `channels` is 2, writes front
+    // left and right, or a single channel twice. If it is 1, writes the mean of all, rounded toward
+    // zero. Returns the number of sample frames written.
     int32_t (*pcm)(const av_decoder *decoder, int32_t channels, int32_t skip, int32_t count,
                    int16_t *pcm);
 
-    // `setup` is the three header packets in Xiph's packing. Returns null on failure.
+    // `setup` holds the three header packets, packed with Xiph lacing. Returns null on failure.
     vorbis_parser *(*parser_open)(const uint8_t *setup, int32_t setup_bytes);
     void (*parser_close)(vorbis_parser *parser);  // null is allowed
     // Returns the number of sample frames of a packet that starts with `first`; <= 0 if not audio.

@@ -1,5 +1,5 @@
-// Loads the table from libwexaaudio_av.so in the folder of the library that contains this code. It
-// stays loaded until the process ends.
+// Loads the table from libwexaaudio_av.so in the folder of the library that contains this code.
+// That library stays loaded until the process ends.
 #include <android/log.h>
 #include <dlfcn.h>
 

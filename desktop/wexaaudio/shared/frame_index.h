@@ -22,11 +22,11 @@ struct frame_index {
 // if memory runs out or there are more frames or samples than any real file has.
 bool frame_index_add(frame_index *index, int64_t offset, int32_t bytes, int32_t samples);
 
-// Returns the number of the frame that contains `sample`: the last frame that starts at or before
+// Returns the index of the frame that contains `sample`: the last frame that starts at or before
 // it. Returns 0 before the first frame and count - 1 past the end. The index must not be empty.
 int64_t frame_index_find(const frame_index *index, int64_t sample);
 
-// Returns the end of the last frame in sample frames; 0 if the index is empty.
+// Returns the end of the last frame in sample frames, or 0 if the index is empty.
 int64_t frame_index_end(const frame_index *index);
 
 #endif

@@ -32,8 +32,8 @@ void io_file_close(io_file *f);
 int64_t io_file_read(io_file *f, int64_t offset, void *buf, int64_t count);
 
 // Returns the buffered bytes at `offset`, valid until the next call, and stores their count in
-// *got. Unless the file ends first, there are at least `want`, which must not exceed kMaxLook.
-// Returns null outside the file and on a read error, which also sets `failed`.
+// *got. There are at least `want` bytes unless the file ends first; `want` must not exceed
+// kMaxLook. Returns null outside the file and on a read error, which also sets `failed`.
 const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *got);
 
 // Returns `count` bytes at `offset` as io_file_peek does, or null if the file has fewer.

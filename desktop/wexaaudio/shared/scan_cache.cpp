@@ -38,7 +38,7 @@ bool is_same(const cached_scan &a, const cached_scan &b) {
            a.file.st_ctim.tv_nsec == b.file.st_ctim.tv_nsec;
 }
 
-// Returns the cached scan of the same file and increments its use count; null if there is none.
+// Returns the cached scan of the same file and increments its use count, or returns null.
 cached_scan *find(const cached_scan &wanted) {
     const std::lock_guard<std::mutex> guard(lock);
     cached_scan *c = scans;

@@ -15,8 +15,8 @@ constexpr int32_t kMaxTracks = 64;
 // Result of a scan. Readers of the same file share it, so it never changes.
 struct stream_info {
     frame_index frames;  // owned
-    frame_index pages;   // owned; the page bodies of Ogg: `first` is the logical offset, `samples`
-                         // the size in bytes. The offsets in `frames` are then logical, too
+    frame_index pages;   // owned; the page bodies of Ogg: `first` is a logical offset and `samples`
+                         // a size in bytes. For Ogg, the offsets in `frames` are logical, too
     const char *codec;   // libavcodec's name; null if no stream can be decoded
     uint8_t *setup;      // owned; set-up data of the decoder, or null
     int32_t setup_bytes;
@@ -26,9 +26,9 @@ struct stream_info {
     int64_t delay;         // sample frames that the source drops at the start; seeks and the
                            // duration do not count them
 
-    // To deliver frame n, a fresh decoder must start earlier. Count back from n, or from the first
-    // frame of its group: first `preroll` frames, then as many as contain `reservoir` bytes of
-    // payload. Each group has its own decoder.
+    // To deliver frame n, a fresh decoder must start earlier: `preroll` frames before n (or before
+    // n's group), plus enough frames to contain `reservoir` bytes of payload. Each group has its
+    // own decoder.
     int32_t group;  // frames in a group, or 0 if there are no groups
     int32_t preroll;
     int32_t reservoir;

@@ -11,7 +11,7 @@ namespace {
 
 constexpr int32_t kFailed = -3;  // a read error
 
-// Returns the first frame to decode so that frame n is bit-identical to a linear read of it.
+// Returns the frame where decoding must start so that frame n is the same as in a linear read.
 int64_t first_needed(const stream_info *info, int64_t n) {
     if (info->group > 0) n -= n % info->group;
     n = std::max<int64_t>(n - info->preroll, 0);
@@ -22,8 +22,8 @@ int64_t first_needed(const stream_info *info, int64_t n) {
     return n;
 }
 
-// Returns the number of sample frames in the output; 0 if the frame cannot be decoded; kFailed or
-// kCodecNoMemory, which end the read.
+// Returns the number of sample frames in the output, or 0 if the frame cannot be decoded. Returns
+// kFailed or kCodecNoMemory if the read must end.
 int32_t decode_frame(stream_reader *r, const frame_entry &entry) {
     if (entry.bytes <= 0 || entry.bytes > kMaxPacket) return 0;
     uint8_t *packet = r->library->packet(r->decoder, entry.bytes);
@@ -50,7 +50,7 @@ int32_t decode_next(stream_reader *r) {
     return held;
 }
 
-// Number of sample frames that the source delivers.
+// Returns the number of sample frames that the source delivers.
 int64_t delivered(const stream_info *info) {
     return std::max<int64_t>(frame_index_end(&info->frames) - info->delay, 0);
 }

@@ -1,6 +1,6 @@
 // Reads one stream of compressed frames as 16-bit PCM, starting at any sample. AAC, MPEG audio, MP4
-// and Ogg share this code: their readers are stream_reader records, and the same functions read,
-// seek and delete them.
+// and Ogg share this code: their readers are stream_reader records, and the same functions read
+// from them, seek in them and delete them.
 //
 // Input: the frames that a format's scan found. Output: PCM. Precedes copy_decoder.cpp.
 #ifndef WEXAAUDIO_STREAM_H
@@ -22,8 +22,8 @@ struct stream_reader {
 // not have this format or cannot be read, if libavcodec is missing or if memory runs out.
 stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration);
 
-// Copies bytes. `offset` is that of a frame_entry, so for Ogg it is logical. Returns the number of
-// bytes copied, fewer if the pages or the file end first; -1 on a read error.
+// Copies bytes. `offset` comes from a frame_entry, so it is logical for Ogg. Returns the number of
+// bytes copied, which is smaller if the pages or the file end first, or -1 on a read error.
 int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
                     int64_t bytes);
 

@@ -1,4 +1,4 @@
-// Reads RIFF WAVE files with 16-bit PCM. Accepts any chunk order, wrong sizes and more than 4 GiB.
+// Reads RIFF WAVE files with 16-bit PCM. Accepts any chunk order, wrong sizes and files over 4 GiB.
 //
 // Input: mtsrc_io. Output: complete sample frames of interleaved PCM, and the information record.
 #include <algorithm>
@@ -100,8 +100,8 @@ bool read_chunks(wav_reader *r) {
     return true;
 }
 
-// Fills in the record, which also shows the source why a file is refused. Returns false and leaves
-// the record empty if the header is too damaged.
+// Fills in the record even if the file is refused, so that the source can see why. Returns false
+// and leaves the record empty if the header is too damaged.
 bool fill_info(xwav_info *info, const wav_reader *r) {
     if (!r->has_format || r->channels == 0 || r->rate <= 0) return false;
     info->codec = r->tag == kTagPcm    ? kWexaPcm

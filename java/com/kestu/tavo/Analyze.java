@@ -14,7 +14,7 @@ import java.util.concurrent.CountDownLatch;
  * <pre>{@code java -Djava.library.path=LIB -jar tavo.jar [options] FILE...}</pre>
  *
  * <p>LIB is the directory of {@code libtavo.so}: {@code build/release/lib} after a build,
- * {@code PREFIX/lib} after an installation, where the jar is
+ * {@code PREFIX/lib} after an installation, which puts the jar at
  * {@code PREFIX/share/java/tavo.jar}.
  *
  * <p>Exit status: 0 on success, 1 if a file failed, 2 for a usage error.
