@@ -55,7 +55,7 @@ extern pthread_cond_t *feat_cond_mt;
 // Fills the zeroed `beat` from `ctx`. If memory runs out, some pointers in `beat` stay null.
 void __beat_init(TAVO_CTX *ctx, TAVO_BEAT_CTX *beat);
 
-// Releases the lock, the condition and all that the context owns, but not the context itself.
+// Releases the lock, the condition and everything that the context owns, but not the context.
 void __tavo_deinit(TAVO_BEAT_CTX *beat);
 
 // Fills matrix[bin][band] for the lower nfft / 2 bins with the weights of `nbands` triangular

@@ -58,7 +58,7 @@ inline void *note_shortage(void *memory) {
 constexpr int64_t kLargeBytes = 4 << 20;  // the functions below pay off from this size on
 
 // Asks for huge pages for a large buffer, which must not have been filled yet. A single page fault
-// then replaces 512 faults and takes a fifth of their time. The system may ignore the request.
+// then replaces 512 faults, in a fifth of their total time. The system may ignore the request.
 void advise_huge_pages(void *buffer, int64_t bytes);
 
 // Allocates at least one byte of uninitialised memory. The caller frees it. A large buffer starts

@@ -75,7 +75,7 @@ extern "C" int32_t tavo_analyze(TAVO_CTX *ctx, int32_t hl_param, int32_t max_bea
         ctx->onset->beat_param2 = beat_param2;
     }
 
-    // Set before the thread exists so that a quick job's final state is not overwritten.
+    // Set the state before the thread exists so that a quick job's final state is not overwritten.
     store_flag(&ctx->state, kStateRunning);
     if (pthread_create(&ctx->worker, nullptr, kJobs[ctx->mode], ctx) != 0) {
         ctx->worker = pthread_t{};

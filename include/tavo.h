@@ -87,7 +87,7 @@ enum {
     TAVO_ERR_CODEC = -255    /**< the codec library could not be set up or has no decoder */
 };
 
-/** Limits of the files that can be analysed. */
+/** Limits on the files that can be analysed. */
 enum {
     TAVO_PATH_BYTES = 512,    /**< size of the longest path, with its terminator */
     TAVO_MIN_FILE_BYTES = 16, /**< smallest file that can be recognised */

@@ -8,7 +8,7 @@
 namespace {
 
 constexpr int32_t kBytesPerSample = 2;
-// A read fails after this many consecutive empty steps: more than four days of MPEG frames.
+// A read fails after this many consecutive empty steps, far more than any real file causes.
 constexpr int32_t kMaxEmptySteps = 16'777'216;
 
 void compact_queue(mtsrc_ctx *src) {

@@ -1,4 +1,4 @@
-// Parses the four-byte headers of MPEG audio frames (ISO/IEC 11172-3, 13818-3 and its 2.5
+// Parses the four-byte headers of MPEG audio frames (ISO/IEC 11172-3, 13818-3 and the 2.5
 // extension) and the parts of a frame's body that the readers need.
 #ifndef WEXAAUDIO_MPEG_HEADER_H
 #define WEXAAUDIO_MPEG_HEADER_H
