@@ -147,8 +147,8 @@ int32_t choose_edge(const search_state *s) {
     return scored != 0 ? scored : first_loud_edge(s);
 }
 
-// Returns the start of the first loud segment or the first valley, whichever comes first. The
-// highlight starts there if a region of the requested length would then reach the song's end.
+// Returns the start of the first loud segment or the first valley, whichever comes first. Used if a
+// region of the requested length that starts at this point reaches the end of the song.
 int32_t fallback_point(const search_state *s) {
     const int32_t start = s->nseg > 0 ? s->start[0] : 0;
     const int32_t valley = s->nv > 0 ? s->valley[0] : 0;

@@ -21,7 +21,7 @@ bash scripts/setup.sh build fuzz
 cmake --preset fuzz >/dev/null
 cmake --build --preset fuzz
 mkdir -p build/fuzz/findings
-# A short quarantine and no huge allocations allow thousands of runs per second.
+# A small quarantine and a limit on allocation size allow thousands of runs per second.
 export ASAN_OPTIONS=allocator_may_return_null=1:max_allocation_size_mb=1024:quarantine_size_mb=8
 
 fuzz() { # fuzz TARGET

@@ -1,6 +1,6 @@
 #!/bin/sh
-# test-aarch64.sh [SONG...]: builds for AArch64 and runs the tests, including the golden results, under qemu. Also
-# compares the results of the SONGs, in any format that ffmpeg reads, with this machine's.
+# test-aarch64.sh [SONG...]: builds for AArch64 and runs the tests, including the golden results, under qemu. If
+# SONGs are given, in any format that ffmpeg reads, also compares their results with those of a native build.
 set -eu
 for song in "$@"; do
   set -- "$@" "$(realpath "$song")"

@@ -13,7 +13,7 @@ using namespace std::string_literals;
 int starts_until_stop = 0;  // the stop arrives after this many thread starts
 int32_t *stop_flag = nullptr;
 
-// Returns a song of drum hits. Each hit fades until the next one, which has another level.
+// Returns a song of drum hits. Each hit fades until the next one, which has a different level.
 std::vector<double> drum_song(double bpm, double seconds) {
     std::vector<double> song(static_cast<size_t>(seconds * kAnalysisRate));
     std::mt19937 random(4);

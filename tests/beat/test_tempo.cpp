@@ -23,7 +23,7 @@ int32_t estimate(std::vector<double> env, const std::vector<pulse_pair> &pairs =
 }  // namespace
 
 // Each pair of pulses correlates only at its own lag. A lag of 20 frames is 129 BPM, one of 27 is
-// 95 BPM. Two rows that differ only in a weight show where another tempo begins to win.
+// 95 BPM. Two rows that differ only in a weight show where a different tempo begins to win.
 TEST(Tempo, BestScoreOfTwoOrThreePeriodsWins) {
     const struct {
         std::vector<std::pair<size_t, double>> weights;  // of each lag

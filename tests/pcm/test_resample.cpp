@@ -112,7 +112,7 @@ TEST(ResampleSinc, RefusesBadArgumentsAndPhases) {
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), 100, nullptr), -1);
     EXPECT_EQ(dorn_resampler_convert(state.get(), in.data(), -1, out.data()), 0);
     EXPECT_EQ(filter(prepare(-48000), in).back(), -1);
-    // A phase of 1/2 is valid. With a ratio of 1.125 the sixth output has an invalid one of 5/8.
+    // A phase of 1/2 is valid. At a ratio of 1.125, the sixth output has an invalid phase of 5/8.
     auto drifting = three_taps(0, 1, 0, 1.5f);
     drifting->coef[960][1] = 5.0f;
     EXPECT_EQ(filter(drifting, in)[1], 5);

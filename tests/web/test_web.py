@@ -1,4 +1,4 @@
-"""Tests tavo.html in a browser: it opens files of every format and gives the command's results."""
+"""Tests tavo.html in a browser: it opens files of every format, with the same results as the command."""
 import base64
 import os
 import pathlib
