@@ -97,8 +97,8 @@ std::string put_statement(const database_kind &kind) {
            ") ON CONFLICT (" + kKey + ") DO UPDATE SET " + changes;
 }
 
-// Returns the query for the next songs after a path, in the order of their paths. The values are
-// the key with that path ($1 to $4) and the status ($5).
+// Returns the query for the next songs after a path, in the order of their paths. $1 to $4 are the
+// key, with that path as $1; $5 is the status.
 std::string page_query(int version) {
     const size_t count = std::size(kResultColumns) - (version < kTableVersion ? kAddedColumns : 0);
     std::string columns = "path";

@@ -1,5 +1,5 @@
 // The click track of one analysis: --click. The library writes the track and ignores write errors,
-// so the command reports them. Without the option these functions do nothing.
+// so the command reports them. Without the option, no track is written.
 //
 // Input: the options and an output file for the track. Output: the track. Used by run/analyse.h.
 #ifndef TAVO_CLI_WRITE_CLICK_H

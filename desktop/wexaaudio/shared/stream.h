@@ -18,8 +18,8 @@ struct stream_reader {
     int32_t skip;             // sample frames to drop from the start of that frame
 };
 
-// Opens a reader and stores the stream's duration in 100-ns units. Returns null if the file does
-// not have this format or cannot be read, if libavcodec is missing or if memory runs out.
+// Opens a reader and stores the stream's duration in 100-ns units. Returns null if `scan`
+// rejects the file, a read fails, libavcodec is missing or memory runs out.
 stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *duration);
 
 // Copies bytes. `offset` comes from a frame_entry, so it is logical for Ogg. Returns the number of
