@@ -12,7 +12,7 @@ constexpr const char *kFooter =
     "name. A list has one name per line (M3U playlists are accepted) and is read as\n"
     "it arrives. Results go to standard output in the order of the inputs, messages\n"
     "to standard error.\n\n"
-    "The start of a highlight is exact to 0.4 s if the loud passage is louder than\n"
+    "The start of a highlight is accurate to 0.4 s if the loud passage is louder than\n"
     "about -13 dBFS RMS. Otherwise it is a point on a 2 s grid, usually 2 to 6 s\n"
     "early, and the text says \"about\"; --normalize refines it. In mode both the\n"
     "tempo is that of the music from the highlight on.\n\n"

@@ -5,7 +5,7 @@ _arguments -s -S \
   '--help[explain the options and end]' \
   '--version[print the version and end]' \
   '(-m --mode)'{-m+,--mode=}'[what to find]:mode:(highlight beats both)' \
-  '(-l --length)'{-l+,--length=}'[length of the highlight wanted]:seconds:' \
+  '(-l --length)'{-l+,--length=}'[length of the highlight]:seconds:' \
   '--max-beats=[maximum number of threshold-selected beats]:number:' \
   '--max-minutes=[refuse audio that lasts longer]:number:' \
   '(-j --jobs)'{-j+,--jobs=}'[files analysed in parallel]:number:' \
@@ -15,7 +15,7 @@ _arguments -s -S \
   '(-f --format)'{-f+,--format=}'[form of the results]:format:(text json csv labels kdenlive llc ffmetadata edl fcpxml otio reaper)' \
   '(-o --output-dir)'{-o+,--output-dir=}'[folder for the marker files]:folder:_files -/' \
   '--print=[write this text for each song]:text:' \
-  '--fps=[frames a second for edl and fcpxml]:rate:(23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60)' \
+  '--fps=[frames per second for edl and fcpxml]:rate:(23.976 24 25 29.97 29.97df 30 50 59.94 59.94df 60)' \
   '--force[overwrite files that exist]' \
   '--skip-existing[skip inputs whose marker file exists]' \
   '--click=[write the sound with a click on every beat]:WAV file:_files' \

@@ -49,7 +49,7 @@ if [[ $status -eq 0 ]]; then
   cat <<'END'
 
 stream     what the file holds: its length, sample rate and channels
-highlight  where the song's strongest loud passage starts: exact to 0.4 s where the music is loud; in
+highlight  where the song's strongest loud passage starts: accurate to 0.4 s where the music is loud; in
            quiet music "about", a point of a 2 s grid, usually 2 to 6 s early. The last run takes the
            place where a seek to the highlight lands, in WAV a whole second
 tempo      beats a minute, to the nearest step of the analysis (117, 123, ...)

@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # scripts/test-fresh.sh [COMMAND]...
-# For use before a release, as root; takes an hour or more. Creates a bare Debian 12 root, clones the last commit into
+# For use before a release, as root; takes about twenty minutes. Creates a bare Debian 12 root, clones the last commit into
 # it under /root and runs the README's first commands, or the COMMANDs. Mounts nothing from this machine: /proc and
 # /dev/pts are new mounts, and /dev contains a few new device nodes.
 set -euo pipefail

@@ -48,8 +48,8 @@ double player_ms(const record &result, double ms);
 // Returns the end of a highlight of length_s seconds, or the end of the song if that is earlier.
 double highlight_end_ms(const record &result, int32_t length_s);
 
-// True if the result shows whether the start of the highlight is exact to 0.4 s. In mode both, it
-// does not, because a seek has moved the start.
+// True if the result shows whether the start of the highlight is accurate to 0.4 s. In mode both,
+// it does not, because a seek has moved the start.
 bool has_refinement(const record &result);
 
 // True if the start of the highlight is exact. Otherwise it is on the loudness curve's 2 s grid.
