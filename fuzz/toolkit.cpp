@@ -3,7 +3,6 @@
 
 #include "dsp/dft.h"
 #include "dsp/fft.h"
-#include "dsp/matrix.h"
 #include "dsp/peaks.h"
 #include "dsp/sort.h"
 #include "fuzz/fuzz.h"
@@ -185,36 +184,10 @@ void sort(fuzz::input *in) {
          "the pivot separates the values");
 }
 
-void multiply(fuzz::input *in) {
-    size_t size[3];  // rows, columns, inner
-    for (size_t &each : size) each = in->ConsumeIntegralInRange<size_t>(0, 9);
-    const auto [rows, columns, inner] = size;
-    auto a = fuzz::padded_values<float>(in, rows * inner);
-    auto b = fuzz::padded_values<float>(in, inner * columns);
-    std::vector<double> d(rows * columns, -1.0);
-    float *a_rows[10], *b_rows[10];
-    double *d_rows[10];
-    for (size_t i = 0; i < rows; ++i) a_rows[i] = a.data() + i * inner;
-    for (size_t i = 0; i < inner; ++i) b_rows[i] = b.data() + i * columns;
-    for (size_t i = 0; i < rows; ++i) d_rows[i] = d.data() + i * columns;
-    const auto n = [](size_t count) { return static_cast<int32_t>(count); };
-    must(MultiplyMtxs(n(rows), n(columns), n(inner), a_rows, b_rows, d_rows) == n(rows),
-         "a product has its rows");
-    for (size_t at = 0; at < d.size(); ++at) {
-        double sum = 0.0;
-        for (size_t k = 0; k < inner; ++k) {
-            const double left = a_rows[at / columns][k], right = b_rows[k][at % columns];
-            if (left != 0.0 && right != 0.0) sum += left * right;
-        }
-        must(d[at] == sum || (std::isnan(d[at]) && std::isnan(sum)), "a product is its sum");
-    }
-}
-
 }  // namespace
 
 int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    fuzz::run_one(
-        {transform, find_sorted_peaks, find_spaced_peaks, find_priority_peaks, sort, multiply},
-        data, size);
+    fuzz::run_one({transform, find_sorted_peaks, find_spaced_peaks, find_priority_peaks, sort},
+                  data, size);
     return 0;
 }

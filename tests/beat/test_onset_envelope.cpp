@@ -16,50 +16,46 @@ bool is_bit_identical(const double *a, const std::vector<double> &b) {
     return true;
 }
 
-// A plain computation of one analysis frame with the functions of dsp/.
-struct plain_frame {
-    TAVO_FFT_CTX fft = {};
-    std::vector<double> window;
+// Returns the powers of one analysis frame.
+std::vector<float> frame_powers(const double *samples, int32_t size, const TAVO_FFT_CTX &fft) {
+    const auto n = static_cast<size_t>(size);
+    std::vector<double> re(n), im(n);
+    for (size_t i = 0; i < n; ++i)
+        re[i] =
+            samples[i] * (0.5 * (1.0 - cos(6.283185307179586 * static_cast<int>(i) / (size - 1))));
+    tavo_fft_proc(re.data(), im.data(), static_cast<int16_t>(size), &fft);
+    std::vector<float> powers(n / 2);
+    for (size_t j = 0; j < n / 2; ++j)
+        powers[j] = static_cast<float>(re[j] * re[j] + im[j] * im[j]);
+    return powers;
+}
 
-    explicit plain_frame(int32_t size) {
-        tavo_fft_init(static_cast<int16_t>(size), &fft);
-        for (int32_t i = 0; i < size; ++i)
-            window.push_back(0.5 * (1.0 - cos(6.283185307179586 * i / (size - 1))));
-    }
-    plain_frame(const plain_frame &) = delete;
-    ~plain_frame() { tavo_fft_deinit(&fft); }
-
-    std::vector<float> powers(const double *samples) const {
-        const size_t size = window.size();
-        std::vector<double> re(size), im(size);
-        for (size_t i = 0; i < size; ++i) re[i] = samples[i] * window[i];
-        tavo_fft_proc(re.data(), im.data(), static_cast<int16_t>(size), &fft);
-        std::vector<float> power;
-        for (size_t j = 0; j < size / 2; ++j)
-            power.push_back(static_cast<float>(re[j] * re[j] + im[j] * im[j]));
-        return power;
-    }
-    std::vector<double> decibels(const double *samples, const float *const *weights) const {
-        const std::vector<float> power = powers(samples);
-        const float *spectrum = power.data();
-        std::vector<double> row(36);
-        double *out = row.data();
-        MultiplyMtxs(1, 36, static_cast<int32_t>(power.size()), &spectrum, weights, &out);
-        for (double &x : row) x = 20.0 * log10(std::max(x, 0.0001));
-        return row;
-    }
-};
-
-// Returns the onset envelope, computed one analysis frame at a time.
+// Returns the onset envelope, computed step by step with the functions of dsp/.
 std::vector<double> envelope(const TAVO_BEAT_CTX &beat, int32_t size, int32_t hop) {
-    const plain_frame frame(size);
-    std::vector<double> change, next, now = frame.decibels(beat.signal, beat.mel_matrix);
-    for (int64_t k = 1; k < beat.frame_count; ++k, now = next) {
-        next = frame.decibels(beat.signal + k * hop, beat.mel_matrix);
+    const auto frames = static_cast<size_t>(beat.frame_count);
+    std::vector<std::vector<float>> powers;
+    std::vector<std::vector<double>> rows(frames, std::vector<double>(36));
+    std::vector<const float *> from;
+    std::vector<double *> to;
+    TAVO_FFT_CTX fft = {};
+    tavo_fft_init(static_cast<int16_t>(size), &fft);
+    for (size_t k = 0; k < frames; ++k) {
+        powers.push_back(frame_powers(beat.signal + static_cast<int64_t>(k) * hop, size, fft));
+        from.push_back(powers[k].data());
+        to.push_back(rows[k].data());
+    }
+    tavo_fft_deinit(&fft);
+    MultiplyMtxs(static_cast<int32_t>(frames), 36, size / 2, from.data(), beat.mel_matrix,
+                 to.data());
+    std::vector<double> change;
+    for (size_t k = 0; k < frames; ++k) {
         double sum = 0.0;
-        for (size_t b = 0; b < 36; ++b)
-            sum += std::isnan(next[b] - now[b]) ? 0.0 : fabs(next[b] - now[b]);
-        change.push_back(sum / 36);
+        for (size_t b = 0; b < 36; ++b) {
+            rows[k][b] = 20.0 * log10(std::max(rows[k][b], 0.0001));
+            const double difference = k > 0 ? rows[k][b] - rows[k - 1][b] : 0.0;
+            sum += std::isnan(difference) ? 0.0 : fabs(difference);
+        }
+        if (k > 0) change.push_back(sum / 36);
     }
     double mean = 0.0, deviation = 0.0;
     getMeanStd(change.data(), beat.frame_count - 1, &mean, &deviation);
