@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# scripts/setup.sh [build|java|tests|web|cluster|fuzz|measure|package]...
+# scripts/setup.sh [build|java|tests|web|cluster|fuzz|measure|package|first]...
 # Installs the Debian packages that are missing for the named groups; by default for build, java, tests, web and
 # fuzz. build alone is enough for the library and the command. Prints nothing if no package is missing.
 set -euo pipefail
@@ -22,6 +22,7 @@ cluster=(slurm-wlm munge postgresql postgresql-client) # scripts/test-cluster.sh
 fuzz=(clang libclang-rt-14-dev)
 measure=(clang libclang-rt-14-dev gcovr valgrind)
 package=(dpkg-dev debhelper dh-python doxygen lintian debootstrap) # scripts/test-package.sh, scripts/test-fresh.sh
+first=("${build[@]}" "${java[@]}" "${fuzz[@]}" libgtest-dev python3 clang-format) # the first steps of scripts/test.sh
 
 wanted=()
 for group in "${@:-build java tests web fuzz}"; do
@@ -35,7 +36,8 @@ for group in "${@:-build java tests web fuzz}"; do
       fuzz) wanted+=("${fuzz[@]}") ;;
       measure) wanted+=("${measure[@]}") ;;
       package) wanted+=("${package[@]}") ;;
-      *) echo "setup: unknown group '$name'; groups: build, java, tests, web, cluster, fuzz, measure, package" >&2; exit 2 ;;
+      first) wanted+=("${first[@]}") ;;
+      *) echo "setup: unknown group '$name'; groups: build, java, tests, web, cluster, fuzz, measure, package, first" >&2; exit 2 ;;
     esac
   done
 done

@@ -8,4 +8,4 @@ if [[ $# -eq 0 ]]; then
   set -- "${files[@]}"
 fi
 # Standard error only reports the number of suppressed warnings; the exit status reports errors.
-printf '%s\0' "$@" | xargs -0 -P "$(nproc)" -n 3 clang-tidy -p build/release --quiet 2>/dev/null
+printf '%s\0' "$@" | xargs -0 -P "$(nproc)" -n 2 clang-tidy -p build/release --quiet 2>/dev/null

@@ -13,9 +13,6 @@
 extern "C" const char *__asan_default_options() {
     return "allocator_may_return_null=1:max_allocation_size_mb=512";
 }
-extern "C" const char *__tsan_default_options() {
-    return "allocator_may_return_null=1:max_allocation_size_mb=512";
-}
 
 namespace {
 

