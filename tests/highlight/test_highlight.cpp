@@ -144,6 +144,7 @@ TEST(Valleys, AreTheEndsOfQuietStretches) {
     EXPECT_EQ(find_valleys({5}, 0.34375f, 0.75f, 0.25f), indexes{5});
     EXPECT_EQ(find_valleys({5}, 0.34375f), indexes{5});
     EXPECT_EQ(find_valleys({0}), indexes{0});
+    EXPECT_EQ(find_valleys({0, 10}), indexes{10});
     EXPECT_EQ(find_valleys({4, 6, 9}), (indexes{6, 9}));
     indexes many;
     for (int32_t at = 1; at < 50; at += 3) many.push_back(at);
