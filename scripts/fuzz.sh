@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # scripts/fuzz.sh [--keep] SECONDS [TARGET]...
-# Runs each fuzzer TARGET (all five by default) for SECONDS, and stores failing inputs in build/fuzz/findings.
+# Runs each fuzzer TARGET (all four by default) for SECONDS, and stores failing inputs in build/fuzz/findings.
 # An input that takes more than 2 s fails. A fuzzer starts from its corpus (fuzz/corpus/TARGET.tar.gz and
 # fuzz/corpus/TARGET) and, if its inputs are files, from the tests' short songs. --keep then finds a set of inputs with
 # the same coverage and replaces the archive with the smallest of them (60 at most, below 6 KiB each).
@@ -15,7 +15,7 @@ seconds=${1:-}
 [[ $seconds =~ ^[0-9]+$ ]] || { sed -n '2,3s/^# //p' "$0" >&2; exit 2; }
 shift
 targets=("$@")
-[[ $# -gt 0 ]] || targets=(source recognition job stages toolkit)
+[[ $# -gt 0 ]] || targets=(source job stages toolkit)
 
 bash scripts/setup.sh build fuzz
 cmake --preset fuzz >/dev/null
@@ -32,7 +32,7 @@ fuzz() { # fuzz TARGET
   tar -xzf fuzz/corpus/"$1".tar.gz -C "$found"
   local inputs=(build/fuzz/work/"$1" "$found")
   [[ ! -d fuzz/corpus/$1 ]] || inputs+=(fuzz/corpus/"$1")
-  case $1 in source | recognition | job) inputs+=(tests/results/songs) ;; esac
+  case $1 in source | job) inputs+=(tests/results/songs) ;; esac
   mkdir -p "${inputs[0]}"
   "${program[@]}" -max_total_time="$seconds" -max_len=8192 -artifact_prefix=build/fuzz/findings/"$1"- \
     "${inputs[@]}" >build/fuzz/"$1".log 2>&1 || { tail -n 40 build/fuzz/"$1".log >&2; return 1; }

@@ -5,7 +5,7 @@
 #include <cstring>
 #include <vector>
 
-#include "desktop/wexaaudio/av/pcm16.h"
+#include "desktop/wexaaudio/av/pcm16.cpp"  // its library does not export these functions
 
 namespace {
 
