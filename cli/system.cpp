@@ -6,16 +6,38 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <csignal>
 #include <cstdlib>
 #include <cstring>
 
+#include "cli/options.h"
+
 namespace {
 
+constexpr int kStopSignals[] = {SIGINT, SIGTERM, SIGHUP};
+
+volatile sig_atomic_t first_stop = 0;
 temporary_file *own_file = nullptr;
 
-void on_signal(int /*number*/) {
+void on_stop(int number) {
+    if (first_stop != 0) _exit(kExitSignal + number);
+    first_stop = number;
+}
+
+void on_end(int /*number*/) {
     remove_file(*own_file);
     _exit(EXIT_FAILURE);
+}
+
+// Installs a signal handler without SA_RESTART, so that the signal interrupts a blocked call.
+// Returns the previous handler.
+auto set_handler(int number, void (*handler)(int)) {
+    struct sigaction action {};
+    struct sigaction before {};
+    action.sa_handler = handler;
+    sigemptyset(&action.sa_mask);
+    sigaction(number, &action, &before);
+    return before.sa_handler;
 }
 
 }  // namespace
@@ -39,15 +61,6 @@ int write_all(int fd, std::string_view bytes) {
     return 0;
 }
 
-signal_handler set_signal_handler(int number, signal_handler handler) {
-    struct sigaction action {};
-    struct sigaction before {};
-    action.sa_handler = handler;
-    sigemptyset(&action.sa_mask);
-    sigaction(number, &action, &before);
-    return before.sa_handler;
-}
-
 int wait_for_end(pid_t &pid) {
     int status = 0;
     while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
@@ -64,6 +77,24 @@ std::string ending_text(int status) {
     return "with status " + std::to_string(WEXITSTATUS(status));
 }
 
+void watch_for_stop() {
+    for (const int number : kStopSignals) {
+        // A command started by nohup continues after a SIGHUP.
+        const bool was_ignored = set_handler(number, on_stop) == SIG_IGN;
+        if (was_ignored && number == SIGHUP) set_handler(number, SIG_IGN);
+    }
+    set_handler(SIGPIPE, SIG_IGN);
+    set_handler(SIGXFSZ, SIG_IGN);  // writing beyond the size limit returns an error
+}
+
+void ignore_stop_signals() {
+    for (const int number : kStopSignals) set_handler(number, SIG_IGN);
+}
+
+int stop_signal() {
+    return first_stop;
+}
+
 std::shared_ptr<temporary_file> share_temporary_file() {
     void *memory = mmap(nullptr, sizeof(temporary_file), PROT_READ | PROT_WRITE,
                         MAP_SHARED | MAP_ANONYMOUS, -1, 0);
@@ -74,7 +105,7 @@ std::shared_ptr<temporary_file> share_temporary_file() {
 
 int remove_file_at_signal(temporary_file &file) {
     own_file = &file;
-    set_signal_handler(SIGALRM, on_signal);
+    set_handler(SIGALRM, on_end);
     return SIGALRM;
 }
 

@@ -1,11 +1,10 @@
-// Helpers for file descriptors and processes, shared by several parts of the command.
+// Helpers for file descriptors, signals and processes, shared by several parts of the command.
 #ifndef TAVO_CLI_SYSTEM_H
 #define TAVO_CLI_SYSTEM_H
 
 #include <sys/types.h>
 
 #include <climits>
-#include <csignal>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -20,17 +19,25 @@ bool is_readable(int fd);
 // Writes all bytes; continues after an interrupted call. Returns 0 or errno.
 int write_all(int fd, std::string_view bytes);
 
-using signal_handler = void (*)(int);
-
-// Installs a signal handler without SA_RESTART, so that the signal interrupts a blocked read.
-// Returns the previous handler.
-signal_handler set_signal_handler(int number, signal_handler handler);
-
 // Waits for a child process to end and sets pid to -1. Returns the waitpid status.
 int wait_for_end(pid_t &pid);
 
 // Converts a waitpid status to words: "by signal 9 (Killed)" or "with status 1".
 std::string ending_text(int status);
+
+// ---- Stop signals: Ctrl-C, a termination request or a closed terminal. The first one asks the
+// command to stop; the second one ends it immediately.
+
+// Installs the handlers, which interrupt blocked calls. Ignores SIGPIPE and SIGXFSZ, so that a
+// failed write returns an error instead.
+void watch_for_stop();
+
+// Ignores the stop signals in a worker process, which ends when its socket is closed.
+void ignore_stop_signals();
+
+int stop_signal();  // number of the first signal, or 0
+
+// ---- The temporary file of a worker process.
 
 // The path of the temporary file that a worker process is writing. The worker shares this memory
 // with the command: if either process dies, the other one removes the file.

@@ -200,7 +200,7 @@ supply_state ready_if(bool is_input) {
 
 supply_state look_at_entry(input_supply &supply, input &out) {
     if (supply.entries.empty()) return ready_if(leave_folder(supply, out));
-    out = {std::move(supply.entries.back()), {}};
+    out = {std::move(supply.entries.back())};
     supply.entries.pop_back();
     struct stat info {};
     if (stat(out.path.c_str(), &info) != 0) return supply_state::searching;
@@ -217,7 +217,7 @@ supply_state look_at_entry(input_supply &supply, input &out) {
 }
 
 supply_state look_at_path(input_supply &supply, const std::string &path, input &out) {
-    out = {path, {}};
+    out = {path};
     struct stat info {};
     if (stat(path.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) return supply_state::ready;
     supply.found = supply.skipped = 0;

@@ -1,7 +1,6 @@
 // Finds the files to analyse, one at a time, in the order of the command line.
 //
-// Input: the files, folders and lists in the options. Output: one input per file. Used by
-// run/analyse_inputs.h.
+// Input: the files, folders and lists in the options. Output: one input per file. Used by main.cpp.
 #ifndef TAVO_CLI_INPUT_INPUTS_H
 #define TAVO_CLI_INPUT_INPUTS_H
 
@@ -15,10 +14,15 @@
 
 #include "cli/failure.h"
 #include "cli/options.h"
+#include "cli/store/store.h"
 
+// An input, from its discovery to its result.
 struct input {
-    std::string path;  // any bytes except NUL
-    failure refusal;   // set if the input is already known to be unusable
+    std::string path = {};    // any bytes except NUL
+    failure refusal = {};     // set if the input is already known to be unusable
+    std::string stored = {};  // the result as JSON, if the store has it; otherwise empty
+    file_state file = {};     // for the store
+    uint64_t index = 0;       // number of earlier inputs
 };
 
 // A list of names that is read as it arrives: from a file, a pipe or a terminal.

@@ -8,7 +8,6 @@
 #include <cerrno>
 #include <csignal>
 
-#include "cli/run/stop.h"
 #include "cli/system.h"
 #include "cli/write/format.h"
 #include "cli/write/value_text.h"

@@ -2,7 +2,7 @@
 // output, messages to standard error. On a terminal it also draws a progress line: a bar, files
 // done, files per minute and the time left.
 //
-// Input: replies of worker processes. Used by analyse_inputs.h.
+// Input: replies of worker processes. Used by main.cpp.
 #ifndef TAVO_CLI_RUN_ORDERED_OUTPUT_H
 #define TAVO_CLI_RUN_ORDERED_OUTPUT_H
 
@@ -29,8 +29,6 @@ struct ordered_output {
     bool is_drawn = false;  // the progress line is on the terminal
     std::chrono::steady_clock::time_point started;
 };
-
-constexpr int kRedrawMs = 500;  // time between two redraws of the progress line
 
 // Fails if the report's index cannot be created.
 failure start_output(ordered_output &output, const options &opts);

@@ -5,22 +5,17 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
-#include <iterator>
 
-#include "cli/run/stop.h"
-#include "cli/system.h"
 #include "cli/write/value_text.h"
 
 namespace {
 
-using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 
-constexpr milliseconds kStopPatience{1000};
+constexpr std::chrono::seconds kStopPatience{1};
 
 // Runs in the new process. Closes its copies of the other workers' sockets, because otherwise those
 // workers would not notice the end of the command.
@@ -29,7 +24,8 @@ constexpr milliseconds kStopPatience{1000};
     ignore_stop_signals();
     prctl(PR_SET_PDEATHSIG, remove_file_at_signal(file));
     if (getppid() != command) _exit(kExitFailed);  // the command has already ended
-    exit(serve_requests(fd, pool.opts));
+    serve_inputs(fd, pool.opts);
+    exit(kExitOk);
 }
 
 failure start_process(process_pool &pool) {
@@ -68,10 +64,10 @@ worker_process *find_idle(process_pool &pool, failure &failed) {
     return nullptr;
 }
 
-// Returns the result of a job whose worker ended without a reply.
+// Returns the result of an input whose worker ended without a reply.
 record unfinished_record(const process_pool &pool, const worker_process &worker, int status) {
-    record result = {worker.current->entry.path, pool.opts.mode};
-    if (pool.is_stopping) {
+    record result = {worker.current->path, pool.opts.mode};
+    if (pool.is_stopping || stop_signal() != 0) {
         result.status = outcome::stopped;
     } else if (steady_clock::now() >= worker.deadline) {
         result.error = "The analysis took more than " + std::to_string(pool.opts.timeout_s) +
@@ -82,19 +78,20 @@ record unfinished_record(const process_pool &pool, const worker_process &worker,
     return result;
 }
 
-void finish_job(const process_pool &pool, worker_process &worker, reply &&answer) {
+void finish_input(const process_pool &pool, worker_process &worker, reply &&answer) {
     pool.on_reply(std::move(*worker.current), std::move(answer));
     worker.current.reset();
     worker.deadline = time_point::max();
 }
 
-// Called when the worker has closed its socket.
+// Called when the worker has closed its socket or its reply was interrupted by a stop.
 void reap(process_pool &pool, worker_process &worker) {
     close_fd(worker.fd);
+    kill(worker.pid, SIGKILL);
     const int status = wait_for_end(worker.pid);
     remove_file(*worker.file);
     if (worker.current) {
-        finish_job(pool, worker, make_reply(unfinished_record(pool, worker, status), pool.opts));
+        finish_input(pool, worker, make_reply(unfinished_record(pool, worker, status), pool.opts));
     } else if (status != 0 && !pool.is_stopping) {
         pool.on_bad_end(
             {"an analysis process without a file was ended " + ending_text(status) + "."});
@@ -102,35 +99,29 @@ void reap(process_pool &pool, worker_process &worker) {
 }
 
 void read_from(process_pool &pool, worker_process &worker) {
-    std::array<char, 65536> part;
-    const ssize_t got = read(worker.fd, part.data(), part.size());
-    if (got > 0) {
-        worker.received.append(part.data(), static_cast<size_t>(got));
-        reply answer;
-        if (decode(worker.received, answer)) finish_job(pool, worker, std::move(answer));
-    } else if (got == 0 || errno != EINTR) {
+    reply answer;
+    if (receive_reply(worker.fd, answer)) {
+        finish_input(pool, worker, std::move(answer));
+    } else {
         reap(pool, worker);
     }
 }
 
 }  // namespace
 
-bool send_job(process_pool &pool, job &next) {
-    failure &refusal = next.entry.refusal;
-    worker_process *worker = refusal ? nullptr : find_idle(pool, refusal);
-    if (refusal) {
-        const record result = {next.entry.path, pool.opts.mode, outcome::failed, refusal.sentence};
+bool assign(process_pool &pool, input &next) {
+    worker_process *worker = next.refusal ? nullptr : find_idle(pool, next.refusal);
+    if (next.refusal) {
+        const record result = {next.path, pool.opts.mode, outcome::failed, next.refusal.sentence};
         pool.on_reply(std::move(next), make_reply(result, pool.opts));
         return true;
     }
     if (worker == nullptr) return false;
-    const request message = {next.index, next.entry.path, next.stored};
+    send_input(worker->fd, next);
     worker->current = std::move(next);
     if (pool.opts.timeout_s > 0) {
         worker->deadline = steady_clock::now() + std::chrono::seconds(pool.opts.timeout_s);
     }
-    // If the worker has died, read_from detects it, so no check is needed here.
-    write_all(worker->fd, encode(message));
     return true;
 }
 
@@ -144,13 +135,7 @@ void end_workers(process_pool &pool, bool is_stop) {
 
 void poll_workers(process_pool &pool, std::vector<pollfd> &watched, int wait_ms) {
     const size_t others = watched.size();
-    for (const worker_process &worker : pool.processes) {
-        watched.push_back({worker.fd, POLLIN, 0});
-        if (worker.deadline == time_point::max()) continue;
-        const auto left = std::chrono::ceil<milliseconds>(worker.deadline - steady_clock::now());
-        const int left_ms = static_cast<int>(std::max<int64_t>(left.count(), 0));
-        wait_ms = wait_ms < 0 ? left_ms : std::min(wait_ms, left_ms);
-    }
+    for (const worker_process &worker : pool.processes) watched.push_back({worker.fd, POLLIN, 0});
     const bool is_ready = poll(watched.data(), watched.size(), wait_ms) > 0;
     for (size_t i = 0; i < pool.processes.size(); ++i) {
         worker_process &worker = pool.processes[i];

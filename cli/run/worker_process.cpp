@@ -2,12 +2,10 @@
 
 #include <malloc.h>
 #include <sys/mman.h>
+#include <sys/socket.h>
 #include <unistd.h>
 
-#include <array>
-#include <cerrno>
 #include <cstdlib>
-#include <cstring>
 #include <exception>
 #include <fstream>
 #include <iterator>
@@ -23,7 +21,7 @@
 #include "cli/write/markers.h"
 #include "cli/write/output_file.h"
 
-NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(request, index, path, stored)
+NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(input, index, path, stored)
 NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(reply, status, result, message, json, row)
 
 namespace {
@@ -34,19 +32,38 @@ constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappi
 constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
 constexpr int kFreeMemoryKept = 64 << 20;
 
+void send_message(int fd, const nlohmann::json &message) {
+    std::string bytes;
+    nlohmann::json::to_cbor(message, bytes);
+    const size_t size = bytes.size();
+    write_all(fd, {reinterpret_cast<const char *>(&size), sizeof size});
+    write_all(fd, bytes);
+}
+
+// Returns false at the end of the connection.
+template <typename record_type>
+bool receive_message(int fd, record_type &message) {
+    size_t size = 0;
+    if (recv(fd, &size, sizeof size, MSG_WAITALL) != sizeof size) return false;
+    std::string bytes(size, '\0');
+    if (recv(fd, bytes.data(), size, MSG_WAITALL) != static_cast<ssize_t>(size)) return false;
+    nlohmann::json::from_cbor(bytes).get_to(message);
+    return true;
+}
+
 // Returns a result from the store. Opens the song if its page is requested.
-record read_stored(const request &message, const options &opts, int stop_fd, song_file &song) {
+record read_stored(const input &next, const options &opts, int stop_fd, song_file &song) {
     record out;
     try {
-        out = record_from_json(message.stored);
+        out = record_from_json(next.stored);
     } catch (const std::exception &) {
         out.mode = opts.mode;
         out.error = "Its row in the store is damaged.";
     }
-    out.file = message.path;
-    if (!opts.report.empty() && !open_song(message.path, stop_fd, song)) {
+    out.file = next.path;
+    if (!opts.report.empty() && !open_song(next.path, stop_fd, song)) {
         const bool needs_ffmpeg = !out.decoder.empty();
-        if (!needs_ffmpeg || !decode_song(message.path, opts, stop_fd, song)) {
+        if (!needs_ffmpeg || !decode_song(next.path, opts, stop_fd, song)) {
             out.sound_path = song.path;
         }
     }
@@ -76,18 +93,18 @@ failure write_markers(record &result, const options &opts) {
 }
 
 // Checks, before the analysis, that the page, the marker file and the clip can be written.
-failure check_side_files(const request &message, const options &opts) {
+failure check_side_files(const input &next, const options &opts) {
     failure failed;
     if (!opts.report.empty()) {
-        failed = check_report(report_page_path(opts, message.index, message.path), opts.force);
+        failed = check_report(report_page_path(opts, next.index, next.path), opts.force);
     }
     if (!failed && opts.markers != nullptr) {
         // With a store, an existing file may be from this song, so write_markers compares contents.
         const bool may_exist = opts.force || is_stored(opts);
-        failed = check_target(marker_path(message.path, opts), may_exist);
+        failed = check_target(marker_path(next.path, opts), may_exist);
     }
     if (!failed && !opts.clip.empty()) {
-        failed = check_target(clip_path(message.path, opts), opts.force);
+        failed = check_target(clip_path(next.path, opts), opts.force);
     }
     return failed;
 }
@@ -107,45 +124,28 @@ failure write_side_files(record &result, const options &opts, uint64_t index, in
     return failed;
 }
 
-// Returns the reply for a failure that is not the song's fault, so the store does not record it.
-reply make_failed_reply(const request &message, const options &opts, int stop_fd,
-                        const std::string &error) {
-    record result = {message.path, opts.mode, outcome::failed, error};
-    if (is_readable(stop_fd)) result.status = outcome::stopped;
-    reply out = make_reply(result, opts);
-    out.json.clear();
-    return out;
-}
-
-reply analyse_and_write(const request &message, const options &opts, int stop_fd) {
+// Analyses an input and writes its files. A failure to write one is not the song's fault, so the
+// store does not record it.
+reply serve(const input &next, const options &opts, int stop_fd) {
     song_file song;
     std::string row;
     record result;
-    failure failed = check_side_files(message, opts);
+    failure failed = check_side_files(next, opts);
     if (!failed) {
-        result = message.stored.empty() ? analyse(message.path, opts, stop_fd, song)
-                                        : read_stored(message, opts, stop_fd, song);
+        result = next.stored.empty() ? analyse(next.path, opts, stop_fd, song)
+                                     : read_stored(next, opts, stop_fd, song);
         result.length_s = opts.length_s;
-    }
-    if (result.status == outcome::ok) {
-        failed = write_side_files(result, opts, message.index, stop_fd, song, row);
-    } else if (is_readable(stop_fd)) {
-        result.status = outcome::stopped;
+        if (result.status == outcome::ok) {
+            failed = write_side_files(result, opts, next.index, stop_fd, song, row);
+        }
     }
     close_song(song);
-    if (failed) return make_failed_reply(message, opts, stop_fd, failed.sentence);
-    reply out = make_reply(result, opts);
-    if (!row.empty()) out.row = row;
-    return out;
-}
-
-std::string serve(const request &message, const options &opts, int stop_fd) {
-    try {
-        return encode(analyse_and_write(message, opts, stop_fd));
-    } catch (const std::exception &) {  // only allocations can fail here
-        const char *error = "There is not enough memory for the result.";
-        return encode(make_failed_reply(message, opts, stop_fd, error));
-    }
+    if (failed) result = {next.path, opts.mode, outcome::failed, failed.sentence};
+    if (result.status == outcome::failed && is_readable(stop_fd)) result.status = outcome::stopped;
+    reply answer = make_reply(result, opts);
+    if (failed) answer.json.clear();
+    if (result.status == outcome::ok) answer.row = row;
+    return answer;
 }
 
 // Each job reuses the heap of the previous one instead of asking the system for new pages. The heap
@@ -180,44 +180,25 @@ reply make_reply(const record &result, const options &opts) {
     return out;
 }
 
-int serve_requests(int fd, const options &opts) {
+void send_input(int fd, const input &next) {
+    send_message(fd, next);
+}
+
+bool receive_reply(int fd, reply &answer) {
+    return receive_message(fd, answer);
+}
+
+void serve_inputs(int fd, const options &opts) {
     prepare_heap();
-    std::string received;
-    std::array<char, 4096> part;
-    while (true) {
-        const ssize_t got = read(fd, part.data(), part.size());
-        if (got < 0 && errno == EINTR) continue;
-        if (got <= 0) return kExitOk;
-        received.append(part.data(), static_cast<size_t>(got));
-        request message;
-        if (!decode(received, message)) continue;
-        if (write_all(fd, serve(message, opts, fd)) != 0) return kExitOk;
+    for (input next; receive_message(fd, next);) {
+        reply answer;
+        try {
+            answer = serve(next, opts, fd);
+        } catch (const std::exception &) {  // only allocations can fail here
+            const char *error = "There is not enough memory for the result.";
+            answer = make_reply({next.path, opts.mode, outcome::failed, error}, opts);
+            answer.json.clear();
+        }
+        send_message(fd, answer);
     }
 }
-
-// An encoded message is a CBOR object, preceded by its size in bytes. Its strings may contain any
-// bytes, because neither side checks that they are UTF-8.
-
-template <typename record_type>
-std::string encode(const record_type &message) {
-    std::string bytes;
-    nlohmann::json::to_cbor(message, bytes);
-    const size_t size = bytes.size();
-    return std::string(reinterpret_cast<const char *>(&size), sizeof size) + bytes;
-}
-
-template <typename record_type>
-bool decode(std::string &received, record_type &message) {
-    size_t size = 0;
-    if (received.size() < sizeof size) return false;
-    memcpy(&size, received.data(), sizeof size);
-    if (received.size() - sizeof size < size) return false;
-    nlohmann::json::from_cbor(received.substr(sizeof size, size)).get_to(message);
-    received.erase(0, sizeof size + size);
-    return true;
-}
-
-template std::string encode(const request &message);
-template std::string encode(const reply &message);
-template bool decode(std::string &received, request &message);
-template bool decode(std::string &received, reply &message);

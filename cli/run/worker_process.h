@@ -1,21 +1,17 @@
-// A worker process: receives requests, analyses their files, writes markers, pages and clips, and
+// A worker process: receives inputs, analyses their files, writes markers, pages and clips, and
 // replies.
 //
-// Input: one request at a time, from process_pool.h. Output: a reply to each, for ordered_output.h.
+// Input: one input at a time, from process_pool.h. Output: a reply to each, for ordered_output.h.
+// Each message on the socket is a CBOR object, preceded by its size. Its strings may contain any
+// bytes.
 #ifndef TAVO_CLI_RUN_WORKER_PROCESS_H
 #define TAVO_CLI_RUN_WORKER_PROCESS_H
 
-#include <cstdint>
 #include <string>
 
+#include "cli/input/inputs.h"
 #include "cli/options.h"
 #include "cli/run/record.h"
-
-struct request {
-    uint64_t index = 0;  // index of the input
-    std::string path;
-    std::string stored;  // the result as JSON, if the store has it; otherwise empty
-};
 
 struct reply {
     outcome status = outcome::failed;
@@ -27,16 +23,13 @@ struct reply {
 
 reply make_reply(const record &result, const options &opts);
 
-// Serves requests until the other end of the socket is closed. Returns the exit status.
-int serve_requests(int fd, const options &opts);
+// Sends an input to a worker. A worker that has ended is noticed when its reply is received.
+void send_input(int fd, const input &next);
 
-// Encodes a request or a reply for the socket.
-template <typename record_type>
-std::string encode(const record_type &message);
+// Waits until the whole reply has arrived. Returns false if the worker has ended.
+bool receive_reply(int fd, reply &answer);
 
-// Decodes the message at the start of `received` and removes it. Returns false if it is not
-// complete yet.
-template <typename record_type>
-bool decode(std::string &received, record_type &message);
+// Serves inputs until the other end of the socket is closed.
+void serve_inputs(int fd, const options &opts);
 
 #endif

@@ -1,6 +1,5 @@
 #include "cli/store/store.h"
 
-#include <poll.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -10,7 +9,6 @@
 #include <iterator>
 #include <nlohmann/json.hpp>
 
-#include "cli/run/stop.h"
 #include "cli/system.h"
 #include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
@@ -25,6 +23,7 @@ constexpr size_t kBatchRows = 100;
 constexpr milliseconds kBatchAge{2000};
 constexpr int64_t kFirstWaitMs = 500;  // doubled each time
 constexpr int64_t kLongestWaitMs = 30'000;
+constexpr useconds_t kSliceUs = 50'000;  // time between two checks for a stop
 
 // ---- The table and its SQL.
 
@@ -186,8 +185,9 @@ failure persist(store &db, const std::function<failure()> &work) {
             wait_ms = std::min(wait_ms, left_ms);
             fprintf(stderr, "tavo: the store does not answer (%s); trying again in %.1f s.\n",
                     reason.c_str(), static_cast<double>(wait_ms) / 1000.0);
-            pollfd stop = {stop_fd(), POLLIN, 0};
-            may_retry = poll(&stop, 1, static_cast<int>(wait_ms)) <= 0;
+            const auto end = steady_clock::now() + milliseconds(wait_ms);
+            while (stop_signal() == 0 && steady_clock::now() < end) usleep(kSliceUs);
+            may_retry = stop_signal() == 0;
         }
         if (may_retry) continue;
         db.has_failed = true;
@@ -318,13 +318,8 @@ failure add_song(store &db, stored_song &&song) {
 }
 
 failure commit_old_batch(store &db) {
-    return batch_timeout_ms(db) == 0 ? commit_batch(db) : failure();
-}
-
-int batch_timeout_ms(const store &db) {
-    if (db.batch.empty() || db.has_failed) return -1;
-    const auto left = kBatchAge - (steady_clock::now() - db.batch_since);
-    return static_cast<int>(std::max<int64_t>(std::chrono::ceil<milliseconds>(left).count(), 0));
+    const bool is_old = steady_clock::now() - db.batch_since >= kBatchAge;
+    return is_old ? commit_batch(db) : failure();
 }
 
 failure read_next(store &db, stored_song &song, bool &found) {

@@ -3,7 +3,7 @@
 //
 // Input: results as JSON (write/json.h). Output: one row for each song and set of parameters. A
 // batch of rows is one transaction, so a command that is killed loses at most the open batch and
-// leaves no row half-written. Used by run/analyse_inputs.h, in the command's own process.
+// leaves no row half-written. Used by main.cpp, in the command's own process.
 #ifndef TAVO_CLI_STORE_STORE_H
 #define TAVO_CLI_STORE_STORE_H
 
@@ -63,7 +63,6 @@ failure add_song(store &db, stored_song &&song);
 
 // Commits the batch if it is old.
 failure commit_old_batch(store &db);
-int batch_timeout_ms(const store &db);  // time until the batch is old, for poll; -1 if it is empty
 
 // With --from-store: reads the next row for the command's parameters, in the order of the paths.
 // found is false after the last row.
