@@ -1,14 +1,11 @@
 #include "cli/run/analyse.h"
 
-#include <poll.h>
-#include <sys/eventfd.h>
 #include <sys/resource.h>
 
 #include <algorithm>
-#include <atomic>
-#include <cerrno>
+#include <chrono>
 #include <cmath>
-#include <iterator>
+#include <future>
 
 #include "cli/input/player_offset.h"
 #include "cli/input/recognise.h"
@@ -20,30 +17,25 @@
 namespace {
 
 constexpr int64_t kMsPerMinute = 60'000;
+constexpr std::chrono::milliseconds kStopCheck{50};  // time between two checks for a stop
 
 // Mean square, full scale 1, to which --normalize raises the loudest 6 s: -8 dBFS. At this level,
 // any rise of 3 dB is large enough for the library to refine the highlight.
 constexpr double kRaisedPower = 0.1585;
 
-// Reports the end of a job to the waiting thread. Set by the job's thread.
-struct job_end {
-    std::atomic<const TAVO_INFO *> result{nullptr};
-    int fd = -1;  // eventfd that wakes the waiting thread
-};
+using job_end = std::promise<const TAVO_INFO *>;
 
-void on_result(TAVO_INFO *info, void *user) {
-    auto *end = static_cast<job_end *>(user);
-    end->result.store(info, std::memory_order_release);
-    eventfd_write(end->fd, 1);
+void on_result(TAVO_INFO *info, void *end) {
+    static_cast<job_end *>(end)->set_value(info);
 }
 
 // Waits for the end of the job or a stop. Returns the job's result; null after a stop.
-const TAVO_INFO *wait_for_result(const job_end &end, int stop_fd) {
-    pollfd watched[] = {{end.fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
-    while (poll(watched, std::size(watched), -1) < 0) {  // EINTR
+const TAVO_INFO *wait_for_result(job_end &end, int stop_fd) {
+    std::future<const TAVO_INFO *> result = end.get_future();
+    while (result.wait_for(kStopCheck) != std::future_status::ready) {
+        if (is_readable(stop_fd)) return nullptr;
     }
-    if (watched[0].revents == 0) return nullptr;
-    return end.result.load(std::memory_order_acquire);
+    return result.get();
 }
 
 // Returns the mean square of the loudest window, full scale 1; 0 in mode beats.
@@ -79,11 +71,8 @@ void read_result(const TAVO_CTX *ctx, const TAVO_INFO *info, const song_file &so
 // Runs an instance's job and releases the instance.
 void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, const song_file &song, record &out) {
     job_end end;
-    end.fd = eventfd(0, EFD_CLOEXEC);
     tavo_set_listener(ctx, on_result, &end);
-    if (end.fd < 0) {
-        out.error = system_sentence("The analysis could not be started", errno);
-    } else if (const int32_t code = tavo_analyze(ctx, opts.length_s, opts.max_beats, 0)) {
+    if (const int32_t code = tavo_analyze(ctx, opts.length_s, opts.max_beats, 0)) {
         out.error =
             std::string("The analysis could not be started: ") + tavo_error_text(code) + ".";
     } else if (const TAVO_INFO *info = wait_for_result(end, stop_fd)) {
@@ -92,7 +81,6 @@ void run_job(TAVO_CTX *ctx, const options &opts, int stop_fd, const song_file &s
         out.error = "The analysis was stopped.";
     }
     tavo_deinit(ctx);  // after a stop it waits for the callback, which uses `end`
-    close_fd(end.fd);
 }
 
 void analyse_opened(const options &opts, int stop_fd, song_file &song, record &out);

@@ -3,9 +3,12 @@
 #ifndef TAVO_CLI_RUN_RECORD_H
 #define TAVO_CLI_RUN_RECORD_H
 
+#include <algorithm>
 #include <cstdint>
 #include <string>
 #include <vector>
+
+#include "include/tavo.h"
 
 enum class outcome {
     ok,
@@ -43,16 +46,26 @@ struct record {
 };
 
 // Converts a time in the record to a player's time, at least 0.
-double player_ms(const record &result, double ms);
+inline double player_ms(const record &result, double ms) {
+    return std::max(ms - result.offset_ms, 0.0);
+}
 
 // Returns the end of a highlight of length_s seconds, or the end of the song if that is earlier.
-double highlight_end_ms(const record &result, int32_t length_s);
+inline double highlight_end_ms(const record &result, int32_t length_s) {
+    const double start = result.hl_pos_ms;
+    const double end = std::min(start + 1000.0 * length_s, static_cast<double>(result.duration_ms));
+    return std::max(start, end);
+}
 
 // True if the result shows whether the start of the highlight is accurate to 0.4 s. In mode both,
 // it does not, because a seek has moved the start.
-bool has_refinement(const record &result);
+inline bool has_refinement(const record &result) {
+    return result.has_highlight && result.mode == TAVO_MODE_HIGHLIGHT;
+}
 
 // True if the start of the highlight is exact. Otherwise it is on the loudness curve's 2 s grid.
-bool is_refined(const record &result);
+inline bool is_refined(const record &result) {
+    return result.hl_pos_ms % TAVO_LOUDNESS_HOP_MS != 0;
+}
 
 #endif
