@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <strings.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -26,11 +25,13 @@
 
 namespace {
 
+namespace fs = std::filesystem;
+
 constexpr size_t kMostNameBytes = PATH_MAX;  // longer paths cannot be opened
 constexpr const char *kByteOrderMark = "\xEF\xBB\xBF";
 
 // Extensions of formats that ffmpeg reads but the library may be unable to read. In a folder, files
-// with these extensions count as audio if ffmpeg is available, whatever they contain.
+// with these extensions count as audio, whatever they contain.
 constexpr const char *kMediaSuffixes[] = {
     ".3gp", ".ac3", ".aif", ".aifc", ".aiff", ".amr",  ".ape", ".au",   ".avi",
     ".caf", ".dsf", ".dts", ".eac3", ".flv",  ".m2ts", ".m4a", ".m4b",  ".m4v",
@@ -41,28 +42,24 @@ void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
 }
 
-file_id id_of(const struct stat &info) {
-    return {info.st_dev, info.st_ino};
+// Returns a path whose folders are no links, to compare it with others.
+std::string resolved(const fs::path &path) {
+    std::error_code failed;
+    return fs::weakly_canonical(path.parent_path() / ".", failed) / path.filename();
 }
 
 // Claims the marker file or clip of an input, so that no other input writes the same file. Returns
 // false if the input must be skipped.
 bool claim_target(input_supply &supply, input &entry, const std::string &target) {
-    struct stat file {};
-    struct stat folder {};
-    if (supply.opts.skip_existing && lstat(target.c_str(), &file) == 0) {
+    std::error_code failed;
+    if (supply.opts.skip_existing && fs::exists(fs::symlink_status(target, failed))) {
         ++supply.existing;
         return false;
     }
-    const std::string name = base_name(target);
-    const std::string folder_path = target.substr(0, target.size() - name.size()) + ".";
-    if (stat(folder_path.c_str(), &folder) != 0 || stat(entry.path.c_str(), &file) != 0) {
-        return true;  // a failure is reported when the file is read or written
-    }
-    const auto [claim, is_first] =
-        supply.targets.emplace(std::pair(id_of(folder), name), id_of(file));
+    const std::string source = fs::weakly_canonical(entry.path, failed);
+    const auto [claim, is_first] = supply.targets.emplace(resolved(target), source);
     if (is_first) return true;
-    if (claim->second == id_of(file)) {
+    if (claim->second == source) {
         add_note(supply, shown(entry.path) + ": named more than once, done once.");
         return false;
     }
@@ -79,12 +76,12 @@ bool claim_targets(input_supply &supply, input &entry) {
 }
 
 // Adds the entries of a folder, unless this search has already entered it through another link.
-failure enter_folder(input_supply &supply, const std::string &path, const struct stat &info) {
-    if (!supply.searched.insert(id_of(info)).second) return {};
-    std::vector<std::string> entries;
+failure enter_folder(input_supply &supply, const std::string &path) {
     std::error_code code;
-    std::filesystem::directory_iterator entry(path, code);
-    for (; !code && entry != std::filesystem::directory_iterator(); entry.increment(code)) {
+    if (!supply.searched.insert(fs::weakly_canonical(path, code)).second) return {};
+    std::vector<std::string> entries;
+    fs::directory_iterator entry(path, code);
+    for (; !code && entry != fs::directory_iterator(); entry.increment(code)) {
         entries.push_back(entry->path());
     }
     if (code) return {system_sentence("The folder cannot be read", code.value())};
@@ -110,18 +107,17 @@ bool leave_folder(input_supply &supply, input &out) {
 }
 
 // True if the file must be analysed or reported. Sets `refusal` if the file cannot be read.
-bool is_audio(const std::string &path, const options &opts, failure &refusal) {
+bool is_audio(const std::string &path, failure &refusal) {
     file_kind kind = file_kind::unknown;
     if (const int code = recognise(path, kind)) {
         refusal = {system_sentence("The file cannot be read", code)};
         return code == EACCES || code == EPERM || code == EIO;
     }
     if (kind != file_kind::unknown) return true;
-    const std::string suffix = std::filesystem::path(path).extension();
-    const auto is_suffix = [&](const char *s) { return strcasecmp(suffix.c_str(), s) == 0; };
-    const bool may_hold_audio =
-        std::any_of(std::begin(kMediaSuffixes), std::end(kMediaSuffixes), is_suffix);
-    if (may_hold_audio && !opts.ffmpeg.empty()) return true;
+    const std::string suffix = fs::path(path).extension();
+    for (const char *media : kMediaSuffixes) {
+        if (strcasecmp(suffix.c_str(), media) == 0) return true;
+    }
     // The library also finds MPEG audio that follows other bytes.
     song_file song;
     if (open_song(path, -1, song)) return false;
@@ -135,61 +131,57 @@ failure cannot_read_list(int code) {
 }
 
 // Refuses NUL bytes without -0, and a song passed by mistake, which would yield thousands of names.
-failure check_start(const name_list &list, char separator) {
-    const file_kind kind = recognise_bytes(list.text);
+failure check_start(const std::string &text, char separator) {
+    const file_kind kind = recognise_bytes(text);
     if (kind != file_kind::unknown) {
-        const std::string subject = list.name == "-" ? "Standard input" : "The list";
-        return {subject + " holds sound (" + kind_name(kind) + "), not a list of names; " +
-                (list.name == "-" ? "save it to a file first." : "name it as FILE.")};
+        return {std::string("This is sound (") + kind_name(kind) +
+                "), not a list of names; name it as FILE, which is /dev/stdin for a pipe."};
     }
-    if (separator != '\0' && list.text.find('\0') != std::string::npos) {
+    if (separator != '\0' && text.find('\0') != std::string::npos) {
         return {"The list holds NUL bytes: give -0 when its names end with them."};
     }
     return {};
 }
 
 bool is_comment(const std::string &line) {
-    struct stat info {};
-    return line[0] == '#' && lstat(line.c_str(), &info) != 0;
+    std::error_code failed;
+    return line[0] == '#' && !fs::exists(fs::symlink_status(line, failed));
 }
 
-// Removes the next complete line from the text and returns it, or returns nothing if there is none.
-// The last line of a list needs no separator.
-std::optional<std::string> read_line(name_list &list, char separator) {
-    const size_t end = list.text.find(separator);
-    if (end == std::string::npos && (!list.ended || list.text.empty())) return std::nullopt;
-    std::string line = list.text.substr(0, end);
-    list.text.erase(0, end == std::string::npos ? end : end + 1);
-    if (separator == '\n' && !line.empty() && line.back() == '\r') line.pop_back();
-    return line;
+// Removes the next name from the text and returns it, or returns nothing if none is complete. The
+// last name needs no separator. A list with one name per line may be an M3U playlist, so comments
+// and carriage returns at line ends are removed.
+std::optional<std::string> next_name(name_list &list, char separator) {
+    while (true) {
+        const size_t end = list.text.find(separator);
+        if (end == std::string::npos && (!list.ended || list.text.empty())) return std::nullopt;
+        std::string line = list.text.substr(0, end);
+        list.text.erase(0, end == std::string::npos ? end : end + 1);
+        if (separator == '\n' && !line.empty() && line.back() == '\r') line.pop_back();
+        if (!line.empty() && (separator != '\n' || !is_comment(line))) return line;
+    }
 }
 
 // Reads the next name. Never waits: `name` is empty if the list has ended or the next name has not
-// arrived yet. A list with one name per line may be an M3U playlist, so comments and carriage
-// returns at line ends are removed.
+// arrived yet.
 failure read_name(name_list &list, char separator, std::optional<std::string> &name) {
-    while (true) {
-        if (!list.begun && !list.text.empty()) {
-            list.begun = true;
-            if (failure failed = check_start(list, separator)) return failed;
-            if (list.text.compare(0, 3, kByteOrderMark) == 0) list.text.erase(0, 3);
-        }
-        while ((name = read_line(list, separator))) {
-            if (name->empty() || (separator == '\n' && is_comment(*name))) continue;
-            ++list.names;
-            return {};
-        }
+    while (!(name = next_name(list, separator)) && !list.ended && is_readable(list.fd)) {
         if (list.text.size() > kMostNameBytes) {
             return {"The list holds a name of more than " + std::to_string(kMostNameBytes) +
                     " bytes; is it a list of names?"};
         }
-        if (list.ended || !is_readable(list.fd)) return {};
         std::array<char, 65536> part;
         const ssize_t got = read(list.fd, part.data(), part.size());
         if (got < 0 && errno != EINTR && errno != EAGAIN) return cannot_read_list(errno);
         list.ended = got == 0;
-        if (got > 0) list.text.append(part.data(), static_cast<size_t>(got));
+        if (got <= 0) continue;
+        list.text.append(part.data(), static_cast<size_t>(got));
+        if (std::exchange(list.begun, true)) continue;
+        if (failure failed = check_start(list.text, separator)) return failed;
+        if (list.text.compare(0, 3, kByteOrderMark) == 0) list.text.erase(0, 3);
     }
+    if (name) list.is_empty = false;
+    return {};
 }
 
 supply_state ready_if(bool is_input) {
@@ -202,14 +194,14 @@ supply_state look_at_entry(input_supply &supply, input &out) {
     if (supply.entries.empty()) return ready_if(leave_folder(supply, out));
     out = {std::move(supply.entries.back())};
     supply.entries.pop_back();
-    struct stat info {};
-    if (stat(out.path.c_str(), &info) != 0) return supply_state::searching;
+    std::error_code failed;
+    const fs::file_status status = fs::status(out.path, failed);
     bool is_input = false;
-    if (S_ISDIR(info.st_mode) && supply.opts.recursive) {
-        out.refusal = enter_folder(supply, out.path, info);
+    if (fs::is_directory(status) && supply.opts.recursive) {
+        out.refusal = enter_folder(supply, out.path);
         is_input = static_cast<bool>(out.refusal);
-    } else if (S_ISREG(info.st_mode)) {
-        is_input = is_audio(out.path, supply.opts, out.refusal);
+    } else if (fs::is_regular_file(status)) {
+        is_input = is_audio(out.path, out.refusal);
         if (!is_input) ++supply.skipped;
     }
     if (is_input) ++supply.found;
@@ -218,11 +210,11 @@ supply_state look_at_entry(input_supply &supply, input &out) {
 
 supply_state look_at_path(input_supply &supply, const std::string &path, input &out) {
     out = {path};
-    struct stat info {};
-    if (stat(path.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) return supply_state::ready;
+    std::error_code failed;
+    if (!fs::is_directory(path, failed)) return supply_state::ready;
     supply.found = supply.skipped = 0;
     supply.searched.clear();
-    out.refusal = enter_folder(supply, path, info);
+    out.refusal = enter_folder(supply, path);
     if (out.refusal) return supply_state::ready;
     supply.folder = path;
     return supply_state::searching;
@@ -234,10 +226,8 @@ supply_state look_at_list(input_supply &supply, input &out) {
     out = {list.name, read_name(list, supply.opts.list_separator, name)};
     if (name) return look_at_path(supply, *name, out);
     if (!out.refusal && !list.ended) return supply_state::waiting;
-    if (!out.refusal && list.names == 0) {
-        const bool is_file = list.name != "-";
-        add_note(supply, (is_file ? "the list " + shown(list.name) : "the list on standard input") +
-                             " names no files.");
+    if (!out.refusal && list.is_empty) {
+        add_note(supply, "the list " + shown(list.name) + " names no files.");
     }
     if (list.fd != STDIN_FILENO) close(list.fd);
     list.fd = -1;

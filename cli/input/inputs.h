@@ -4,12 +4,9 @@
 #ifndef TAVO_CLI_INPUT_INPUTS_H
 #define TAVO_CLI_INPUT_INPUTS_H
 
-#include <sys/types.h>
-
 #include <map>
 #include <set>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "cli/failure.h"
@@ -30,12 +27,10 @@ struct name_list {
     std::string name = {};  // name of the list; "-" is standard input
     int fd = -1;            // -1 if no list is being read
     std::string text = {};  // text that was read and not yet returned
-    size_t names = 0;       // number of names returned
+    bool is_empty = true;   // no name was returned
     bool begun = false;     // the start of the text has been checked
     bool ended = false;     // the end of the list has been read
 };
-
-using file_id = std::pair<dev_t, ino_t>;
 
 struct input_supply {
     const options &opts;
@@ -43,12 +38,12 @@ struct input_supply {
     name_list list = {};                    // list that is being read
     std::string folder = {};                // folder that is being searched, or empty
     std::vector<std::string> entries = {};  // entries of the folder not yet examined, last first
-    std::set<file_id> searched = {};        // the folder and its searched subfolders
+    std::set<std::string> searched = {};    // the folder and its searched subfolders, without links
     size_t found = 0;                       // audio files found in the folder
     size_t skipped = 0;                     // other files found in the folder
     size_t existing = 0;                    // inputs left out by --skip-existing
-    // Folder and name of each marker file or clip, with the input that it belongs to.
-    std::map<std::pair<file_id, std::string>, file_id> targets = {};
+    // The path of each marker file or clip, and that of its input, both without links.
+    std::map<std::string, std::string> targets = {};
     std::string notes = {};  // lines for standard error
 };
 

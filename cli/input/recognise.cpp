@@ -22,21 +22,22 @@ struct signature {
 };
 constexpr signature kSignatures[] = {
     {file_kind::wav, "RIFF", 8, "WAVE"},
-    {file_kind::aiff, "FORM", 8, "AIF"},
     {file_kind::flac, "fLaC"},
     {file_kind::ogg, "OggS\0"sv},
     {file_kind::mp4, "", 4, "ftyp"},
     {file_kind::mp4, "", 4, "moov"},
     {file_kind::mp4, "", 4, "mdat"},
     {file_kind::aac, "ADIF"},
-    {file_kind::asf, "\x30\x26\xB2\x75\x8E\x66\xCF\x11"},
-    {file_kind::matroska, "\x1A\x45\xDF\xA3"},
 };
 
-// In the order of file_kind.
-constexpr const char *kNames[] = {
-    "unknown",         "WAV", "AIFF", "FLAC", "Ogg", "MP4", "AAC", "MP3", "ASF (Windows Media)",
-    "Matroska or WebM"};
+// The format's name and the codings that the library reads in it, in the order of file_kind.
+struct kind_text {
+    const char *name;
+    const char *codings;
+};
+constexpr kind_text kKinds[] = {{"audio", "MPEG"}, {"WAV", "16-bit integer PCM"}, {"FLAC", "FLAC"},
+                                {"Ogg", "Vorbis"}, {"MP4", "AAC or MP3"},         {"AAC", "AAC"},
+                                {"MP3", "MPEG"}};
 
 // Recognises an MPEG audio or ADTS frame header. A UTF-16 byte order mark is not one.
 file_kind recognise_frame(std::string_view head) {
@@ -49,15 +50,14 @@ file_kind recognise_frame(std::string_view head) {
     return is_valid ? file_kind::mpeg : file_kind::unknown;
 }
 
-// Limits of find_read_error, which reads a file again because the library reports no errno.
-constexpr int64_t kHeadBytes = 1 << 20;         // enough to recognise a format
-constexpr int64_t kDescribedBytes = 128 << 20;  // enough to find the description of most streams
-
-// Reads at most the first `most_bytes` bytes. Returns 0, or the errno of the first error.
-int find_read_error(const std::string &path, int64_t most_bytes) {
+// Reads the start of a file again, because the library reports no errno. Returns 0, or the errno of
+// the first error.
+int find_read_error(const std::string &path) {
+    constexpr int64_t kPartBytes = 1 << 20;
+    constexpr int64_t kMostBytes = 128 << 20;  // enough for most songs
     int code = 0;
-    for (int64_t at = 0; at < most_bytes; at += kHeadBytes) {
-        if (read_bytes(path, at, kHeadBytes, code).empty() || code != 0) break;
+    for (int64_t at = 0; at < kMostBytes && code == 0; at += kPartBytes) {
+        if (read_bytes(path, at, kPartBytes, code).empty()) break;
     }
     return code;
 }
@@ -66,49 +66,30 @@ std::string unreadable(int code) {
     return system_sentence("The file cannot be read", code);
 }
 
-std::string explain_format(file_kind kind) {
-    const std::string name = kind_name(kind);
-    const std::string highest = std::to_string(TAVO_MAX_RATE) + " Hz";
-    const std::string rates = std::to_string(TAVO_MIN_RATE) + " to " + highest;
-    switch (kind) {
-        case file_kind::unknown:
-            return "The file is not recognised as audio of a known format.";
-        case file_kind::wav:
-            return "The WAV file is damaged or is not 16-bit integer PCM at up to " + highest +
-                   ", which is all that is read.";
-        case file_kind::mp4:
-            return "The MP4 file's audio is neither AAC nor MP3, or its sample rate is not " +
-                   rates + ".";
-        case file_kind::asf:
-        case file_kind::aiff:
-        case file_kind::matroska:
-            return "The file is " + name + ", a format that is not read.";
-        default:
-            return "The " + name + " file has a sample rate that is not read; " + rates + " are.";
-    }
-}
-
 // Returns a sentence that explains a result of tavo_probe.
 std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream) {
-    const std::string subject = std::string("The ") + kind_name(kind) + " file ";
+    const kind_text &text = kKinds[static_cast<size_t>(kind)];
+    const std::string subject = std::string("The ") + text.name + " file ";
+    const std::string lowest = std::to_string(TAVO_MIN_RATE);
     switch (code) {
         case TAVO_OK:  // see tavo_init
         case TAVO_ERR_MEMORY:
             return "There is not enough memory to analyse the file.";
         case TAVO_ERR_FORMAT:
-            return explain_format(kind);
+            if (kind == file_kind::unknown) {
+                return "The file is not recognised as audio of a known format.";
+            }
+            return subject + "is damaged or is not " + text.codings + " audio at " + lowest +
+                   " to " + std::to_string(TAVO_MAX_RATE) + " Hz, which is all that is read.";
         case TAVO_ERR_OPEN:
-            return subject + "has no usable audio stream" +
-                   (kind == file_kind::ogg ? "; only Vorbis is read from Ogg." : ".");
-        case TAVO_ERR_CODEC:
-            return subject + "cannot be decoded: no decoder accepts its audio.";
+            return subject + "has no usable " + text.codings + " audio.";
         case TAVO_ERR_SHORT:
             return "The audio is too short: it lasts " +
                    formatted("%.3f", static_cast<double>(stream.duration_ms) / 1000) +
                    " s and must last more than 1 s.";
         case TAVO_ERR_LOW_RATE:
             return "The sample rate is too low: it is " + std::to_string(stream.rate) +
-                   " Hz and must be at least " + std::to_string(TAVO_MIN_RATE) + " Hz.";
+                   " Hz and must be at least " + lowest + " Hz.";
         default:
             return subject + "cannot be used: " + tavo_error_text(code) + ".";
     }
@@ -137,7 +118,7 @@ int recognise(const std::string &path, file_kind &kind) {
 }
 
 const char *kind_name(file_kind kind) {
-    return kNames[static_cast<size_t>(kind)];
+    return kKinds[static_cast<size_t>(kind)].name;
 }
 
 std::string read_bytes(const std::string &path, int64_t offset, int64_t size, int &code) {
@@ -189,14 +170,12 @@ int64_t find_id3v2_end(const std::string &path, int &code) {
 std::string explain_refusal(const std::string &path, int32_t code, const TAVO_STREAM &stream) {
     file_kind kind = file_kind::unknown;
     int read_error = recognise(path, kind);
-    if (read_error == 0 && stream.rate == 0) {
-        read_error = find_read_error(path, code == TAVO_ERR_FORMAT ? kHeadBytes : kDescribedBytes);
-    }
+    if (read_error == 0 && stream.rate == 0) read_error = find_read_error(path);
     return read_error != 0 ? unreadable(read_error) : explain_code(kind, code, stream);
 }
 
 std::string explain_lost_audio(const std::string &path, bool has_audio) {
-    if (const int code = find_read_error(path, INT64_MAX)) return unreadable(code);
+    if (const int code = find_read_error(path)) return unreadable(code);
     return has_audio ? "The file could not be read to its end."
                      : "No audio could be decoded from the file.";
 }

@@ -10,7 +10,6 @@ from command_case import AS_ORDINARY_USER, TAVO, Case, standard_song, wav
 
 KEYS = ["file", "mode", "status", "sample_rate", "channels", "duration_ms", "offset_ms"]
 BEATS = ["bpm", "beat_count", "beats_ms"]
-ASF = bytes.fromhex("3026b2758e66cf11a6d900aa0062ce6c")
 
 EMPTY = "--clip --click --report --print --format --output-dir --store --fps --shard --files-from".split()
 USAGE = [
@@ -34,13 +33,12 @@ USAGE = [
 REFUSED = {  # file: its content and part of the reason
     "empty.wav": (b"", "empty"),
     "fifteen.wav": (b"RIFF\0\0\0\0WAVEfmt", "too short to be audio: it has 15 bytes"),
-    "text.wav": (b"This is a letter, not a song.\n" * 99, "not recognised"),
-    "movie.wma": (ASF + bytes(500), "ASF (Windows Media), a format that is not read. ffmpeg, which may"),
-    "24.wav": (wav(bits=24), "not 16-bit integer PCM at up to 48000 Hz, which is all that is read."),
+    "text.wav": (b"This is a letter, not a song.\n" * 99, "not recognised as audio of a known format. ffmpeg, which may"),
+    "24.wav": (wav(bits=24), "not 16-bit integer PCM audio at 8000 to 48000 Hz, which is all that is read."),
     "8.wav": (wav(bits=8, tag=7), "not 16-bit"), "tag.wav": (wav(tag=300), "not 16-bit"), "96k.wav": (wav(rate=96000), "48000 Hz"),
     "1s.wav": (wav(seconds=1.0), "lasts 1.000 s"), "7999.wav": (wav(rate=7999), "7999 Hz"),
     "no-channels.wav": (wav(seconds=0.0)[:22] + b"\0\0" + wav()[24:], "WAV file is damaged or"),
-    "no-data.wav": (wav()[:36], "no usable audio stream"),
+    "no-data.wav": (wav()[:36], "no usable 16-bit integer PCM audio"),
     "lies.wav": (wav(seconds=0.5, data_size=0xFFFFFFFF), "lasts 0.500 s"),
     "long.wav": (wav(seconds=61.0, rate=8000), "The audio lasts 1:01"),
     "silence.wav": (wav(seconds=7.0, sample=b"\0"), "No beats were found"),
