@@ -15,7 +15,6 @@
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
-#include <filesystem>
 #include <iterator>
 #include <sstream>
 
@@ -29,7 +28,6 @@ constexpr size_t kMostMessageBytes = 65536;  // only the first line is used
 // Limit on the address space. A damaged file can make ffmpeg allocate hours of silence at once.
 constexpr rlim_t kMostProgramBytes = rlim_t{448} << 20;
 constexpr int kReadPollMs = 1000;  // time between two checks of the clock
-constexpr int kEndPollMs = 10;     // time between two checks for the end of the program
 
 // Containers that hold their own audio. Playlists and scripts (HLS, concat, DASH, SDP, image
 // sequences) refer to other files and are not accepted.
@@ -39,7 +37,7 @@ constexpr const char *kContainers =
     "mpc,mpc8,mpeg,mpegts,mxf,nut,ogg,oma,rm,shn,sox,tak,truehd,tta,voc,w64,wav,wv,xwma";
 
 struct ffmpeg_process {
-    pid_t pid = -1;       // -1 after it was reaped
+    pid_t pid = -1;
     int sound_fd = -1;    // standard output
     int message_fd = -1;  // standard error
     std::string message;
@@ -71,8 +69,8 @@ std::vector<std::string> command_line(const ffmpeg_task &task) {
     if (getppid() != parent) _exit(EXIT_FAILURE);
     const rlimit memory = {kMostProgramBytes, kMostProgramBytes};
     setrlimit(RLIMIT_AS, &memory);
-    const bool ready = dup2(input, STDIN_FILENO) >= 0 && dup2(output, STDOUT_FILENO) >= 0 &&
-                       dup2(messages, STDERR_FILENO) >= 0;
+    const bool ready = (input < 0 || dup2(input, STDIN_FILENO) >= 0) &&
+                       dup2(output, STDOUT_FILENO) >= 0 && dup2(messages, STDERR_FILENO) >= 0;
     syscall(SYS_close_range, STDERR_FILENO + 1, ~0U, 0);
     if (ready) execv(words[0], words);
     _exit(EXIT_FAILURE);
@@ -86,15 +84,12 @@ int start_ffmpeg(const ffmpeg_task &task, ffmpeg_process &process) {
                    [](std::string &word) { return word.data(); });
     int sound[2] = {-1, -1};
     int messages[2] = {-1, -1};
-    int input =
-        task.fd >= 0 ? fcntl(task.fd, F_DUPFD_CLOEXEC, 0) : open("/dev/null", O_RDONLY | O_CLOEXEC);
-    const bool opened =
-        input >= 0 && pipe2(sound, O_CLOEXEC) == 0 && pipe2(messages, O_CLOEXEC) == 0;
     const pid_t parent = getpid();
-    if (opened) process.pid = fork();
-    if (process.pid == 0) become_ffmpeg(pointers.data(), input, sound[1], messages[1], parent);
+    if (pipe2(sound, O_CLOEXEC) == 0 && pipe2(messages, O_CLOEXEC) == 0) process.pid = fork();
+    if (process.pid == 0) become_ffmpeg(pointers.data(), task.fd, sound[1], messages[1], parent);
     const int code = process.pid < 0 ? errno : 0;
-    for (int *fd : {&input, &sound[1], &messages[1]}) close_fd(*fd);
+    close_fd(sound[1]);
+    close_fd(messages[1]);
     process.sound_fd = sound[0];
     process.message_fd = messages[0];
     return code;
@@ -107,15 +102,14 @@ std::string_view read_part(int &fd, std::array<char, 65536> &part) {
     return {part.data(), static_cast<size_t>(std::max<ssize_t>(got, 0))};
 }
 
-// Reads both pipes until they end, then waits for the process to end and stores its status.
-failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink, int &status) {
+// Reads both pipes until they end, which they do when the process ends.
+failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink) {
     std::array<char, 65536> part;
     auto deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
-    while (process.pid >= 0) {
+    while (process.sound_fd >= 0 || process.message_fd >= 0) {
         pollfd watched[] = {
             {process.sound_fd, POLLIN, 0}, {process.message_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
-        const bool is_ending = process.sound_fd < 0 && process.message_fd < 0;
-        poll(watched, std::size(watched), is_ending ? kEndPollMs : kReadPollMs);
+        poll(watched, std::size(watched), kReadPollMs);
         if (watched[2].revents != 0) return {"The analysis was stopped."};
         if (clock_type::now() > deadline) {
             return {"ffmpeg made no progress for " + std::to_string(kIdleSeconds) +
@@ -129,18 +123,8 @@ failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink, 
             deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
             if (failure failed = sink(read_part(process.sound_fd, part))) return failed;
         }
-        if (is_ending && waitpid(process.pid, &status, WNOHANG) > 0) process.pid = -1;
     }
     return {};
-}
-
-// Closes the pipes, and kills the process if it has not ended.
-void kill_ffmpeg(ffmpeg_process &process) {
-    close_fd(process.sound_fd);
-    close_fd(process.message_fd);
-    if (process.pid < 0) return;
-    kill(process.pid, SIGKILL);
-    wait_for_end(process.pid);
 }
 
 // Returns the first line of the messages without the names of ffmpeg's module and of the file.
@@ -171,23 +155,23 @@ std::string find_ffmpeg() {
     std::istringstream folders(variable == nullptr ? "" : variable);
     for (std::string folder; std::getline(folders, folder, ':');) {
         const std::string path = folder + "/ffmpeg";
-        std::error_code ignored;
-        if (path.front() == '/' && access(path.c_str(), X_OK) == 0 &&
-            std::filesystem::is_regular_file(path, ignored)) {
-            return path;
-        }
+        if (path.front() == '/' && access(path.c_str(), X_OK) == 0) return path;
     }
     return "";
 }
 
 failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink) {
     ffmpeg_process process;
-    int status = 0;
-    const int code = start_ffmpeg(task, process);
     failure failed;
-    if (code != 0) failed = {system_sentence("ffmpeg could not be started", code)};
-    if (!failed) failed = read_pipes(process, stop_fd, sink, status);
-    if (!failed) failed = explain_end(task, process.message, status);
-    kill_ffmpeg(process);
+    if (const int code = start_ffmpeg(task, process)) {
+        failed = {system_sentence("ffmpeg could not be started", code)};
+    } else {
+        failed = read_pipes(process, stop_fd, sink);
+        if (failed) kill(process.pid, SIGKILL);
+        const int status = wait_for_end(process.pid);
+        if (!failed) failed = explain_end(task, process.message, status);
+    }
+    close_fd(process.sound_fd);
+    close_fd(process.message_fd);
     return failed;
 }

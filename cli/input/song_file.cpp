@@ -9,7 +9,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <charconv>
+#include <cstdio>
 #include <string_view>
 
 #include "cli/input/ffmpeg.h"
@@ -31,23 +31,17 @@ constexpr int64_t kMostWavBytes = (int64_t{1} << 32) - 4096;  // a WAV file has 
 constexpr int64_t kMostSamplesPerByte = 2048;
 constexpr int64_t kSpareSeconds = 60;
 
-// Returns the descriptor that a path such as /dev/stdin refers to, or -1.
-int named_descriptor(const std::string &path) {
-    int fd = -1;
-    if (path == "/dev/stdin") return STDIN_FILENO;
-    for (const std::string_view folder : {"/dev/fd/", "/proc/self/fd/"}) {
-        const char *end = path.data() + path.size();
-        if (path.compare(0, folder.size(), folder) != 0) continue;
-        if (std::from_chars(path.data() + folder.size(), end, fd).ptr == end) return fd;
-    }
-    return -1;
-}
-
-// True for a pipe or socket that the command inherited. The command's own pipes are close-on-exec.
-bool is_inherited_pipe(int fd) {
+// Returns the inherited pipe or socket that a path such as /dev/stdin refers to, or -1. The
+// command's own pipes are close-on-exec.
+int inherited_pipe(const std::string &path) {
+    int fd = STDIN_FILENO;
+    char rest = '\0';
+    const bool is_number = sscanf(path.c_str(), "/dev/fd/%d%c", &fd, &rest) == 1 ||
+                           sscanf(path.c_str(), "/proc/self/fd/%d%c", &fd, &rest) == 1;
     struct stat info {};
-    return fd >= 0 && fstat(fd, &info) == 0 && (S_ISFIFO(info.st_mode) || S_ISSOCK(info.st_mode)) &&
-           (fcntl(fd, F_GETFD) & FD_CLOEXEC) == 0;
+    if ((!is_number && path != "/dev/stdin") || fstat(fd, &info) != 0) return -1;
+    const bool is_pipe = S_ISFIFO(info.st_mode) || S_ISSOCK(info.st_mode);
+    return is_pipe && (fcntl(fd, F_GETFD) & FD_CLOEXEC) == 0 ? fd : -1;
 }
 
 // Copies a pipe until it ends. Returns 0 or errno: ECANCELED after a stop, EFBIG for too much data.
@@ -55,8 +49,9 @@ int copy_pipe(int source, int target, int stop_fd) {
     std::array<char, 65536> part;
     for (off_t bytes = 0; bytes <= kMostPipeBytes;) {
         std::array<pollfd, 2> watched = {{{source, POLLIN, 0}, {stop_fd, POLLIN, 0}}};
-        if (poll(watched.data(), watched.size(), -1) < 0) continue;  // EINTR
+        if (poll(watched.data(), watched.size(), -1) < 0 && errno != EINTR) return errno;
         if (watched[1].revents != 0) return ECANCELED;
+        if (watched[0].revents == 0) continue;
         const ssize_t got = read(source, part.data(), part.size());
         if (got == 0) return 0;
         if (got < 0 && errno != EINTR && errno != EAGAIN) return errno;
@@ -73,7 +68,7 @@ song_file song_at(int fd, int source_fd, bool by_ffmpeg) {
     return {"/proc/self/fd/" + std::to_string(fd), fd, source_fd, by_ffmpeg};
 }
 
-failure read_inherited_pipe(int pipe_fd, int stop_fd, song_file &song) {
+failure read_pipe(int pipe_fd, int stop_fd, song_file &song) {
     int fd = memfd_create("song", MFD_CLOEXEC);
     const int code = fd < 0 ? errno : copy_pipe(pipe_fd, fd, stop_fd);
     const off_t size = lseek(fd, 0, SEEK_CUR);
@@ -186,8 +181,8 @@ failure decode(const std::string &path, const options &opts, int stop_fd, int so
 }  // namespace
 
 failure open_song(const std::string &path, int stop_fd, song_file &song) {
-    const int inherited = named_descriptor(path);
-    if (is_inherited_pipe(inherited)) return read_inherited_pipe(inherited, stop_fd, song);
+    const int pipe_fd = inherited_pipe(path);
+    if (pipe_fd >= 0) return read_pipe(pipe_fd, stop_fd, song);
     if (failure failed = check_file(path)) return failed;
     song = {path == "fd" ? "./fd" : path};  // the library takes "fd" for a descriptor
     if (path.size() < TAVO_PATH_BYTES) return {};
