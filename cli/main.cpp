@@ -85,9 +85,8 @@ void search_inputs(run_state &state) {
 // Does not wait while inputs are being searched for.
 void wait_and_serve(run_state &state) {
     const bool is_listening = may_search(state) && state.found == supply_state::waiting;
-    std::vector<pollfd> watched = {
-        {state.output.to_pipe && !state.is_ending ? STDOUT_FILENO : -1, 0, 0},
-        {is_listening ? state.supply.list.fd : -1, POLLIN, 0}};
+    std::vector<pollfd> watched = {{state.is_ending ? -1 : STDOUT_FILENO, 0, 0},
+                                   {is_listening ? state.supply.list.fd : -1, POLLIN, 0}};
     poll_workers(state.pool, watched, may_search(state) && !is_listening ? 0 : kTickMs);
     if ((watched[0].revents & POLLERR) != 0) state.output.write_error = EPIPE;
     report_failure(state.output, commit_old_batch(state.db));

@@ -1,7 +1,6 @@
 #include "cli/run/ordered_output.h"
 
 #include <sys/ioctl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -52,8 +51,6 @@ std::string progress_text(const ordered_output &output, double seconds) {
 
 failure start_output(ordered_output &output, const options &opts) {
     if (failure failed = begin_report_index(output.index, opts)) return failed;
-    struct stat info {};
-    output.to_pipe = fstat(STDOUT_FILENO, &info) == 0 && S_ISFIFO(info.st_mode);
     output.has_bar = !opts.quiet && isatty(STDERR_FILENO) == 1;
     output.started = std::chrono::steady_clock::now();
     write_result(output, format_head(opts.format));

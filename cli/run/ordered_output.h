@@ -24,9 +24,8 @@ struct ordered_output {
     bool has_failure = false;         // a file failed, or a failure was reported
     int write_error = 0;              // errno of standard output; EPIPE if its reader closed it
     output_file index;                // of the pages
-    bool to_pipe = false;   // standard output is a pipe, whose reader may end before the command
-    bool has_bar = false;   // standard error is a terminal, and not --quiet
-    bool is_drawn = false;  // the progress line is on the terminal
+    bool has_bar = false;             // standard error is a terminal, and not --quiet
+    bool is_drawn = false;            // the progress line is on the terminal
     std::chrono::steady_clock::time_point started;
 };
 

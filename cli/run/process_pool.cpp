@@ -67,9 +67,7 @@ worker_process *find_idle(process_pool &pool, failure &failed) {
 // Returns the result of an input whose worker ended without a reply.
 record unfinished_record(const process_pool &pool, const worker_process &worker, int status) {
     record result = {worker.current->path, pool.opts.mode};
-    if (pool.is_stopping || stop_signal() != 0) {
-        result.status = outcome::stopped;
-    } else if (steady_clock::now() >= worker.deadline) {
+    if (steady_clock::now() >= worker.deadline) {
         result.error = "The analysis took more than " + std::to_string(pool.opts.timeout_s) +
                        " s and was given up (--timeout).";
     } else {
@@ -79,6 +77,8 @@ record unfinished_record(const process_pool &pool, const worker_process &worker,
 }
 
 void finish_input(const process_pool &pool, worker_process &worker, reply &&answer) {
+    const bool is_stopped = pool.is_stopping || stop_signal() != 0;
+    if (is_stopped && answer.status == outcome::failed) answer = {outcome::stopped};
     pool.on_reply(std::move(*worker.current), std::move(answer));
     worker.current.reset();
     worker.deadline = time_point::max();

@@ -70,11 +70,6 @@ record read_stored(const input &next, const options &opts, int stop_fd, song_fil
     return out;
 }
 
-// True if the results are to be stored.
-bool is_stored(const options &opts) {
-    return !opts.store.empty() && !opts.from_store;
-}
-
 bool has_content(const std::string &path, const std::string &content) {
     std::ifstream file(path, std::ios::binary);
     const std::string there((std::istreambuf_iterator<char>(file)), {});
@@ -85,7 +80,7 @@ failure write_markers(record &result, const options &opts) {
     const std::string target = marker_path(result.file, opts);
     const std::string content = marker_content(result, opts);
     // An earlier command may have left the file, if it was killed before it committed the row.
-    if (!is_stored(opts) || !has_content(target, content)) {
+    if (!has_content(target, content)) {
         if (failure failed = write_file(target, content, opts.force)) return failed;
     }
     result.written = target;
@@ -100,7 +95,7 @@ failure check_side_files(const input &next, const options &opts) {
     }
     if (!failed && opts.markers != nullptr) {
         // With a store, an existing file may be from this song, so write_markers compares contents.
-        const bool may_exist = opts.force || is_stored(opts);
+        const bool may_exist = opts.force || !opts.store.empty();
         failed = check_target(marker_path(next.path, opts), may_exist);
     }
     if (!failed && !opts.clip.empty()) {
@@ -141,7 +136,6 @@ reply serve(const input &next, const options &opts, int stop_fd) {
     }
     close_song(song);
     if (failed) result = {next.path, opts.mode, outcome::failed, failed.sentence};
-    if (result.status == outcome::failed && is_readable(stop_fd)) result.status = outcome::stopped;
     reply answer = make_reply(result, opts);
     if (failed) answer.json.clear();
     if (result.status == outcome::ok) answer.row = row;
@@ -176,7 +170,7 @@ reply make_reply(const record &result, const options &opts) {
         out.message = "tavo: " + line;
         if (!opts.report.empty()) out.row = failed_report_row(result);
     }
-    if (is_stored(opts) && result.status != outcome::stopped) out.json = json_record(result);
+    if (!opts.store.empty() && !opts.from_store) out.json = json_record(result);
     return out;
 }
 

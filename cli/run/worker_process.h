@@ -15,10 +15,10 @@
 
 struct reply {
     outcome status = outcome::failed;
-    std::string result;   // for standard output
-    std::string message;  // for standard error
-    std::string json;     // the result to store, or empty
-    std::string row;      // row of the report's index, or empty
+    std::string result = {};   // for standard output
+    std::string message = {};  // for standard error
+    std::string json = {};     // the result to store, or empty
+    std::string row = {};      // row of the report's index, or empty
 };
 
 reply make_reply(const record &result, const options &opts);

@@ -31,7 +31,7 @@ USAGE = [
     ("--normalize --store a.db a.wav", "cannot be combined with --store"),
 ]
 REFUSED = {  # file: its content and part of the reason
-    "empty.wav": (b"", "empty"),
+    "empty.wav": (b"", "it has 0 bytes"),
     "fifteen.wav": (b"RIFF\0\0\0\0WAVEfmt", "too short to be audio: it has 15 bytes"),
     "text.wav": (b"This is a letter, not a song.\n" * 99, "not recognised as audio of a known format. ffmpeg, which may"),
     "24.wav": (wav(bits=24), "not 16-bit integer PCM audio at 8000 to 48000 Hz, which is all that is read."),
