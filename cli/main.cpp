@@ -119,7 +119,7 @@ int analyse_inputs(const options &opts) {
             state.queue.pop_front();
         }
         end_if_done(state);
-        if (state.is_ending && state.pool.processes.empty()) break;
+        if (state.is_ending && state.pool.running == 0) break;
         wait_and_serve(state);
     }
     if (state.db.known_failed > 0) state.output.has_failure = true;

@@ -61,11 +61,10 @@ int write_all(int fd, std::string_view bytes) {
     return 0;
 }
 
-int wait_for_end(pid_t &pid) {
+int wait_for_end(pid_t pid) {
     int status = 0;
     while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
     }
-    pid = -1;
     return status;
 }
 
@@ -87,10 +86,6 @@ void watch_for_stop() {
     set_handler(SIGXFSZ, SIG_IGN);  // writing beyond the size limit returns an error
 }
 
-void ignore_stop_signals() {
-    for (const int number : kStopSignals) set_handler(number, SIG_IGN);
-}
-
 int stop_signal() {
     return first_stop;
 }
@@ -103,10 +98,10 @@ std::shared_ptr<temporary_file> share_temporary_file() {
             [](temporary_file *file) { munmap(file, sizeof *file); }};
 }
 
-int remove_file_at_signal(temporary_file &file) {
+void set_worker_signals(temporary_file &file) {
     own_file = &file;
     set_handler(SIGALRM, on_end);
-    return SIGALRM;
+    for (const int number : kStopSignals) set_handler(number, SIG_IGN);
 }
 
 void note_temporary_file(const std::string &path) {

@@ -19,8 +19,8 @@ bool is_readable(int fd);
 // Writes all bytes; continues after an interrupted call. Returns 0 or errno.
 int write_all(int fd, std::string_view bytes);
 
-// Waits for a child process to end and sets pid to -1. Returns the waitpid status.
-int wait_for_end(pid_t &pid);
+// Waits for a child process to end. Returns the waitpid status.
+int wait_for_end(pid_t pid);
 
 // Converts a waitpid status to words: "by signal 9 (Killed)" or "with status 1".
 std::string ending_text(int status);
@@ -31,9 +31,6 @@ std::string ending_text(int status);
 // Installs the handlers, which interrupt blocked calls. Ignores SIGPIPE and SIGXFSZ, so that a
 // failed write returns an error instead.
 void watch_for_stop();
-
-// Ignores the stop signals in a worker process, which ends when its socket is closed.
-void ignore_stop_signals();
 
 int stop_signal();  // number of the first signal, or 0
 
@@ -48,9 +45,9 @@ struct temporary_file {
 // Returns null if memory runs out.
 std::shared_ptr<temporary_file> share_temporary_file();
 
-// Called in a worker. From then on, note_temporary_file stores its path in `file`, and the signal
-// whose number is returned removes the temporary file and ends the worker.
-int remove_file_at_signal(temporary_file &file);
+// Called in a worker. From then on, note_temporary_file stores its path in `file`, SIGALRM removes
+// the temporary file and ends the worker, and the stop signals are ignored.
+void set_worker_signals(temporary_file &file);
 
 // Stores the path of this worker's temporary file, or an empty path once the file is gone. A worker
 // has at most one such file at a time. Does nothing in the command itself.

@@ -77,7 +77,6 @@ failure read_pipe(int pipe_fd, int stop_fd, song_file &song) {
         return {};
     }
     close_fd(fd);
-    if (code == ECANCELED) return {"The analysis was stopped."};
     if (code != 0) return {system_sentence("The pipe cannot be read into memory", code)};
     return {"Only " + std::to_string(size) + " bytes came through the pipe."};
 }
@@ -148,12 +147,12 @@ failure decode(const std::string &path, const options &opts, int stop_fd, int so
     const int code = source_fd >= 0 ? fstat(source_fd, &info) : stat(path.c_str(), &info);
     sound.file_bytes = code == 0 ? info.st_size : 0;
     sound.most_minutes = opts.max_minutes;
-    ffmpeg_task task = {opts.ffmpeg, path, source_fd, {}};
-    task.arguments = {"-map", "0:a:0", "-af", kPlayerTimeFilter + filter, "-ac", "1"};
     // Without tags the header has a fixed size.
-    const auto format = {"-c:a", "pcm_s16le", "-map_metadata", "-1", "-bitexact", "-f", "wav"};
-    task.arguments.insert(task.arguments.end(), format.begin(), format.end());
-    task.arguments.emplace_back("pipe:1");
+    ffmpeg_task task = {opts.ffmpeg,
+                        path,
+                        source_fd,
+                        {"-map", "0:a:0", "-af", kPlayerTimeFilter + filter, "-ac", "1", "-c:a",
+                         "pcm_s16le", "-map_metadata", "-1", "-bitexact", "-f", "wav", "pipe:1"}};
     const auto run = [&]() -> failure {
         sound.bytes = sound.rate = 0;
         if (ftruncate(sound.fd, 0) != 0) return cannot_hold(errno);

@@ -20,19 +20,18 @@ constexpr std::chrono::seconds kStopPatience{1};
 // Runs in the new process. Closes its copies of the other workers' sockets, because otherwise those
 // workers would not notice the end of the command.
 [[noreturn]] void become_worker(process_pool &pool, pid_t command, temporary_file &file, int fd) {
-    for (worker_process &other : pool.processes) close_fd(other.fd);
-    ignore_stop_signals();
-    prctl(PR_SET_PDEATHSIG, remove_file_at_signal(file));
+    for (worker_process &other : pool.workers) close_fd(other.fd);
+    set_worker_signals(file);
+    prctl(PR_SET_PDEATHSIG, SIGALRM);
     if (getppid() != command) _exit(kExitFailed);  // the command has already ended
     serve_inputs(fd, pool.opts);
     exit(kExitOk);
 }
 
-failure start_process(process_pool &pool) {
-    worker_process worker;
+failure start_worker(process_pool &pool, worker_process &worker) {
     int ends[2] = {-1, -1};
-    worker.file = share_temporary_file();
     const pid_t command = getpid();
+    worker.file = share_temporary_file();
     if (worker.file != nullptr && socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) == 0) {
         worker.pid = fork();
     }
@@ -47,21 +46,8 @@ failure start_process(process_pool &pool) {
         close_fd(worker.fd);
         return {system_sentence("The analysis process could not be started", code)};
     }
-    pool.processes.push_back(std::move(worker));
+    ++pool.running;
     return {};
-}
-
-// Returns an idle worker or a new one; null if neither is available. Sets `failed` if there are no
-// workers at all and none can be started.
-worker_process *find_idle(process_pool &pool, failure &failed) {
-    for (worker_process &worker : pool.processes) {
-        if (!worker.current) return &worker;
-    }
-    if (pool.processes.size() >= static_cast<size_t>(pool.opts.jobs)) return nullptr;
-    const failure not_started = start_process(pool);
-    if (!not_started) return &pool.processes.back();
-    if (pool.processes.empty()) failed = not_started;
-    return nullptr;
 }
 
 // Returns the result of an input whose worker ended without a reply.
@@ -86,7 +72,6 @@ void finish_input(const process_pool &pool, worker_process &worker, reply &&answ
 
 // Called when the worker has closed its socket or its reply was interrupted by a stop.
 void reap(process_pool &pool, worker_process &worker) {
-    close_fd(worker.fd);
     kill(worker.pid, SIGKILL);
     const int status = wait_for_end(worker.pid);
     remove_file(*worker.file);
@@ -96,6 +81,9 @@ void reap(process_pool &pool, worker_process &worker) {
         pool.on_bad_end(
             {"an analysis process without a file was ended " + ending_text(status) + "."});
     }
+    close(worker.fd);
+    worker = {};
+    --pool.running;
 }
 
 void read_from(process_pool &pool, worker_process &worker) {
@@ -110,13 +98,19 @@ void read_from(process_pool &pool, worker_process &worker) {
 }  // namespace
 
 bool assign(process_pool &pool, input &next) {
-    worker_process *worker = next.refusal ? nullptr : find_idle(pool, next.refusal);
+    const auto is_idle = [](const worker_process &worker) { return !worker.current; };
+    const auto worker = std::find_if(pool.workers.begin(), pool.workers.end(), is_idle);
+    if (worker == pool.workers.end()) return false;
+    if (worker->pid < 0 && !next.refusal) {
+        const failure not_started = start_worker(pool, *worker);
+        if (not_started && pool.running > 0) return false;
+        next.refusal = not_started;
+    }
     if (next.refusal) {
         const record result = {next.path, pool.opts.mode, outcome::failed, next.refusal.sentence};
         pool.on_reply(std::move(next), make_reply(result, pool.opts));
         return true;
     }
-    if (worker == nullptr) return false;
     send_input(worker->fd, next);
     worker->current = std::move(next);
     if (pool.opts.timeout_s > 0) {
@@ -127,7 +121,7 @@ bool assign(process_pool &pool, input &next) {
 
 void end_workers(process_pool &pool, bool is_stop) {
     pool.is_stopping = is_stop;
-    for (worker_process &worker : pool.processes) {
+    for (worker_process &worker : pool.workers) {
         shutdown(worker.fd, SHUT_WR);
         if (is_stop) worker.deadline = steady_clock::now() + kStopPatience;
     }
@@ -135,14 +129,11 @@ void end_workers(process_pool &pool, bool is_stop) {
 
 void poll_workers(process_pool &pool, std::vector<pollfd> &watched, int wait_ms) {
     const size_t others = watched.size();
-    for (const worker_process &worker : pool.processes) watched.push_back({worker.fd, POLLIN, 0});
+    for (const worker_process &worker : pool.workers) watched.push_back({worker.fd, POLLIN, 0});
     const bool is_ready = poll(watched.data(), watched.size(), wait_ms) > 0;
-    for (size_t i = 0; i < pool.processes.size(); ++i) {
-        worker_process &worker = pool.processes[i];
+    for (size_t i = 0; i < pool.workers.size(); ++i) {
+        worker_process &worker = pool.workers[i];
         if (is_ready && watched[others + i].revents != 0) read_from(pool, worker);
         if (worker.pid > 0 && steady_clock::now() >= worker.deadline) kill(worker.pid, SIGKILL);
     }
-    const auto has_ended = [](const worker_process &worker) { return worker.pid < 0; };
-    pool.processes.erase(std::remove_if(pool.processes.begin(), pool.processes.end(), has_ended),
-                         pool.processes.end());
 }

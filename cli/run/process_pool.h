@@ -25,7 +25,7 @@
 using time_point = std::chrono::steady_clock::time_point;
 
 struct worker_process {
-    pid_t pid = -1;                           // -1 after it was reaped
+    pid_t pid = -1;                           // -1 if it is not running
     int fd = -1;                              // socket
     std::optional<input> current;             // empty if the worker is idle
     time_point deadline = time_point::max();  // time at which the worker is killed
@@ -38,13 +38,14 @@ struct process_pool {
     std::function<void(input &&, reply &&)> on_reply = {};
     // Called if a worker without an input failed or was killed.
     std::function<void(const failure &)> on_bad_end = {};
-    std::vector<worker_process> processes = {};
+    std::vector<worker_process> workers{static_cast<size_t>(opts.jobs)};
+    size_t running = 0;
     bool is_stopping = false;
 };
 
-// Gives the input to an idle worker, or to a new one if fewer than --jobs are running. If the input
-// has a refusal or no worker can be started, on_reply receives the failure at once. Returns false,
-// with `next` unchanged, if all workers are busy. Does not return in a new worker process.
+// Gives the input to an idle worker, which is started if it is not running. If the input has a
+// refusal or no worker can be started, on_reply receives the failure at once. Returns false, with
+// `next` unchanged, if all workers are busy. Does not return in a new worker process.
 bool assign(process_pool &pool, input &next);
 
 // Asks the workers to end. With is_stop they abort their analyses, and are killed if they have not
