@@ -42,12 +42,6 @@ void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
 }
 
-// Returns a path whose folders are no links, to compare it with others.
-std::string resolved(const fs::path &path) {
-    std::error_code failed;
-    return fs::weakly_canonical(path.parent_path() / ".", failed) / path.filename();
-}
-
 // Claims the marker file or clip of an input, so that no other input writes the same file. Returns
 // false if the input must be skipped.
 bool claim_target(input_supply &supply, input &entry, const std::string &target) {
@@ -57,7 +51,9 @@ bool claim_target(input_supply &supply, input &entry, const std::string &target)
         return false;
     }
     const std::string source = fs::weakly_canonical(entry.path, failed);
-    const auto [claim, is_first] = supply.targets.emplace(resolved(target), source);
+    const std::string resolved = fs::weakly_canonical(fs::absolute(target, failed), failed);
+    if (failed) return true;  // the failure is reported when the file is written
+    const auto [claim, is_first] = supply.targets.emplace(resolved, source);
     if (is_first) return true;
     if (claim->second == source) {
         add_note(supply, shown(entry.path) + ": named more than once, done once.");
