@@ -2,8 +2,10 @@
 
 #include <fcntl.h>
 #include <poll.h>
+#include <sys/mman.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
+#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -17,6 +19,7 @@
 #include <cstring>
 #include <iterator>
 #include <sstream>
+#include <utility>
 
 #include "cli/system.h"
 #include "cli/write/file_names.h"
@@ -27,7 +30,8 @@ namespace {
 constexpr size_t kMostMessageBytes = 65536;  // only the first line is used
 // Limit on the address space. A damaged file can make ffmpeg allocate hours of silence at once.
 constexpr rlim_t kMostProgramBytes = rlim_t{448} << 20;
-constexpr int kReadPollMs = 1000;  // time between two checks of the clock
+constexpr rlim_t kMostOutputBytes = rlim_t{4} << 30;
+constexpr int kCheckMs = 50;  // time between two checks of the output and the clock
 
 // Containers that hold their own audio. Playlists and scripts (HLS, concat, DASH, SDP, image
 // sequences) refer to other files and are not accepted.
@@ -38,7 +42,6 @@ constexpr const char *kContainers =
 
 struct ffmpeg_process {
     pid_t pid = -1;
-    int sound_fd = -1;    // standard output
     int message_fd = -1;  // standard error
     std::string message;
 };
@@ -68,7 +71,9 @@ std::vector<std::string> command_line(const ffmpeg_task &task) {
     prctl(PR_SET_PDEATHSIG, SIGKILL);
     if (getppid() != parent) _exit(EXIT_FAILURE);
     const rlimit memory = {kMostProgramBytes, kMostProgramBytes};
+    const rlimit file = {kMostOutputBytes, kMostOutputBytes};
     setrlimit(RLIMIT_AS, &memory);
+    setrlimit(RLIMIT_FSIZE, &file);
     const bool ready = (input < 0 || dup2(input, STDIN_FILENO) >= 0) &&
                        dup2(output, STDOUT_FILENO) >= 0 && dup2(messages, STDERR_FILENO) >= 0;
     syscall(SYS_close_range, STDERR_FILENO + 1, ~0U, 0);
@@ -77,54 +82,47 @@ std::vector<std::string> command_line(const ffmpeg_task &task) {
 }
 
 // Returns 0 or errno.
-int start_ffmpeg(const ffmpeg_task &task, ffmpeg_process &process) {
+int start_ffmpeg(const ffmpeg_task &task, ffmpeg_process &process, int &output) {
     std::vector<std::string> words = command_line(task);
     std::vector<char *> pointers(words.size() + 1, nullptr);
     std::transform(words.begin(), words.end(), pointers.begin(),
                    [](std::string &word) { return word.data(); });
-    int sound[2] = {-1, -1};
     int messages[2] = {-1, -1};
     const pid_t parent = getpid();
-    if (pipe2(sound, O_CLOEXEC) == 0 && pipe2(messages, O_CLOEXEC) == 0) process.pid = fork();
-    if (process.pid == 0) become_ffmpeg(pointers.data(), task.fd, sound[1], messages[1], parent);
+    output = memfd_create("output", MFD_CLOEXEC);
+    if (output >= 0 && pipe2(messages, O_CLOEXEC) == 0) process.pid = fork();
+    if (process.pid == 0) become_ffmpeg(pointers.data(), task.fd, output, messages[1], parent);
     const int code = process.pid < 0 ? errno : 0;
-    close_fd(sound[1]);
     close_fd(messages[1]);
-    process.sound_fd = sound[0];
     process.message_fd = messages[0];
     return code;
 }
 
-// Reads the available bytes. Closes fd at the end of the pipe or after an error.
-std::string_view read_part(int &fd, std::array<char, 65536> &part) {
-    const ssize_t got = read(fd, part.data(), part.size());
-    if (got == 0 || (got < 0 && errno != EINTR)) close_fd(fd);
-    return {part.data(), static_cast<size_t>(std::max<ssize_t>(got, 0))};
-}
-
-// Reads both pipes until they end, which they do when the process ends.
-failure read_pipes(ffmpeg_process &process, int stop_fd, const byte_sink &sink) {
+// Reads the messages until they end, which they do when the process ends, and checks the output.
+failure watch(ffmpeg_process &process, int stop_fd, const output_check &check, int output) {
     std::array<char, 65536> part;
+    struct stat file {};
     auto deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
-    while (process.sound_fd >= 0 || process.message_fd >= 0) {
-        pollfd watched[] = {
-            {process.sound_fd, POLLIN, 0}, {process.message_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
-        poll(watched, std::size(watched), kReadPollMs);
-        if (watched[2].revents != 0) return {"The analysis was stopped."};
-        if (clock_type::now() > deadline) {
+    while (true) {
+        pollfd watched[] = {{process.message_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
+        poll(watched, std::size(watched), kCheckMs);
+        if (watched[1].revents != 0) return {"The analysis was stopped."};
+        const off_t before = std::exchange(file.st_size, 0);
+        fstat(output, &file);
+        if (file.st_size > before) {
+            deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
+            const failure failed = check ? check(output, file.st_size) : failure();
+            if (failed) return failed;
+        } else if (clock_type::now() > deadline) {
             return {"ffmpeg made no progress for " + std::to_string(kIdleSeconds) +
                     " s and was ended."};
         }
-        if (watched[1].revents != 0) {
-            const std::string_view text = read_part(process.message_fd, part);
-            if (process.message.size() < kMostMessageBytes) process.message += text;
-        }
-        if (watched[0].revents != 0) {
-            deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
-            if (failure failed = sink(read_part(process.sound_fd, part))) return failed;
-        }
+        if (watched[0].revents == 0) continue;
+        const ssize_t got = read(process.message_fd, part.data(), part.size());
+        if (got == 0 || (got < 0 && errno != EINTR)) return {};
+        if (got < 0 || process.message.size() >= kMostMessageBytes) continue;
+        process.message.append(part.data(), static_cast<size_t>(got));
     }
-    return {};
 }
 
 // Returns the first line of the messages without the names of ffmpeg's module and of the file.
@@ -160,18 +158,17 @@ std::string find_ffmpeg() {
     return "";
 }
 
-failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink) {
+failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const output_check &check, int &output) {
     ffmpeg_process process;
     failure failed;
-    if (const int code = start_ffmpeg(task, process)) {
+    if (const int code = start_ffmpeg(task, process, output)) {
         failed = {system_sentence("ffmpeg could not be started", code)};
     } else {
-        failed = read_pipes(process, stop_fd, sink);
+        failed = watch(process, stop_fd, check, output);
         if (failed) kill(process.pid, SIGKILL);
         const int status = wait_for_end(process.pid);
         if (!failed) failed = explain_end(task, process.message, status);
     }
-    close_fd(process.sound_fd);
     close_fd(process.message_fd);
     return failed;
 }

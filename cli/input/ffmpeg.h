@@ -1,14 +1,13 @@
 // Runs the ffmpeg program on one untrusted file.
 //
-// Input: a file, and the arguments that describe the output. Output: the bytes that the program
-// writes to standard output. Used by song_file.h and write/clip.h in a worker process.
+// Input: a file, and the arguments that describe the output. Output: what the program writes to
+// standard output. Used by song_file.h and write/clip.h in a worker process.
 #ifndef TAVO_CLI_INPUT_FFMPEG_H
 #define TAVO_CLI_INPUT_FFMPEG_H
 
-#include <cstddef>
+#include <cstdint>
 #include <functional>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "cli/failure.h"
@@ -20,16 +19,18 @@ struct ffmpeg_task {
     std::vector<std::string> arguments;  // everything after the input
 };
 
-// Receives the program's standard output. If it returns a failure, the program is killed.
-using byte_sink = std::function<failure(std::string_view bytes)>;
+// Called with the size of the program's standard output when it has grown. If it returns a failure,
+// the program is killed. May be null.
+using output_check = std::function<failure(int output, int64_t bytes)>;
 
 // Searches PATH. Returns the path of the ffmpeg program, or an empty string.
 std::string find_ffmpeg();
 
 // Runs the program and waits until it has ended. It is killed if stop_fd becomes readable or if
 // it writes nothing for kIdleSeconds. It can read only the given file, and nothing from the
-// network. A failure quotes the first line of the program's messages.
-failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const byte_sink &sink);
+// network. A failure quotes the first line of the program's messages. `output` receives its
+// standard output, a file in memory, or -1. The caller closes it, also after a failure.
+failure run_ffmpeg(const ffmpeg_task &task, int stop_fd, const output_check &check, int &output);
 
 constexpr int kIdleSeconds = 30;
 

@@ -96,40 +96,21 @@ failure check_file(const std::string &path) {
             " bytes."};
 }
 
-// The output of one ffmpeg run.
-struct decoding {
-    int fd = -1;             // destination
-    int64_t file_bytes = 0;  // of the encoded file
-    int64_t most_minutes = 0;
-    int64_t bytes = 0;
-    int32_t rate = 0;  // Hz; 0 until the header is complete
-};
-
-failure cannot_hold(int code) {
-    return {system_sentence("The decoded sound cannot be held in memory", code)};
-}
-
-failure store_sound(decoding &sound, std::string_view part) {
-    if (const int code = write_all(sound.fd, part)) return cannot_hold(code);
-    sound.bytes += static_cast<int64_t>(part.size());
-    if (sound.rate == 0) {
-        if (sound.bytes < kHeaderBytes) return {};
-        // The field is little-endian, as is every processor that the command runs on.
-        if (pread(sound.fd, &sound.rate, sizeof sound.rate, kRateOffset) < 0) {
-            return cannot_hold(errno);
-        }
-        if (sound.rate < TAVO_MIN_RATE || sound.rate > TAVO_MAX_RATE) {
-            return {"ffmpeg decodes it at " + std::to_string(sound.rate) +
-                    " Hz, which is not read."};
-        }
+// Checks the part of a WAV file that ffmpeg has written so far. Stores the sample rate once the
+// header is complete. `file_bytes` is the size of the encoded file.
+failure check_sound(int fd, int64_t bytes, int64_t file_bytes, int64_t most_minutes,
+                    int32_t &rate) {
+    // The field is little-endian, as is every processor that the command runs on.
+    if (bytes < kHeaderBytes || pread(fd, &rate, sizeof rate, kRateOffset) < 0) return {};
+    if (rate < TAVO_MIN_RATE || rate > TAVO_MAX_RATE) {
+        return {"ffmpeg decodes it at " + std::to_string(rate) + " Hz, which is not read."};
     }
-    const int64_t samples = sound.bytes / 2;
-    if (samples > sound.most_minutes * 60 * sound.rate || sound.bytes > kMostWavBytes) {
+    const int64_t samples = bytes / 2;
+    if (samples > most_minutes * 60 * rate || bytes > kMostWavBytes) {
         return {"The audio is longer than " +
-                count_text(static_cast<size_t>(sound.most_minutes), "minute") + "."};
+                count_text(static_cast<size_t>(most_minutes), "minute") + "."};
     }
-    if (samples / kMostSamplesPerByte >
-        sound.file_bytes + kSpareSeconds * sound.rate / kMostSamplesPerByte) {
+    if (samples / kMostSamplesPerByte > file_bytes + kSpareSeconds * rate / kMostSamplesPerByte) {
         return {"The audio is longer than a file of its size can hold."};
     }
     return {};
@@ -140,37 +121,33 @@ failure store_sound(decoding &sound, std::string_view part) {
 // `filter`, times in the WAV file are player times.
 failure decode(const std::string &path, const options &opts, int stop_fd, int source_fd,
                const std::string &filter, song_file &song) {
-    decoding sound;
-    sound.fd = memfd_create("sound", MFD_CLOEXEC);
-    if (sound.fd < 0) return cannot_hold(errno);
     struct stat info {};
     const int code = source_fd >= 0 ? fstat(source_fd, &info) : stat(path.c_str(), &info);
-    sound.file_bytes = code == 0 ? info.st_size : 0;
-    sound.most_minutes = opts.max_minutes;
+    const int64_t file_bytes = code == 0 ? info.st_size : 0;
     // Without tags the header has a fixed size.
     ffmpeg_task task = {opts.ffmpeg,
                         path,
                         source_fd,
                         {"-map", "0:a:0", "-af", kPlayerTimeFilter + filter, "-ac", "1", "-c:a",
                          "pcm_s16le", "-map_metadata", "-1", "-bitexact", "-f", "wav", "pipe:1"}};
-    const auto run = [&]() -> failure {
-        sound.bytes = sound.rate = 0;
-        if (ftruncate(sound.fd, 0) != 0) return cannot_hold(errno);
-        lseek(sound.fd, 0, SEEK_SET);
-        return run_ffmpeg(task, stop_fd,
-                          [&](std::string_view part) { return store_sound(sound, part); });
+    int fd = -1;
+    int32_t rate = 0;
+    const auto check = [&](int output, int64_t bytes) {
+        return check_sound(output, bytes, file_bytes, opts.max_minutes, rate);
     };
-    failure failed = run();
-    const int32_t accepted = std::clamp<int32_t>(sound.rate, TAVO_MIN_RATE, TAVO_MAX_RATE);
-    if (sound.rate > 0 && sound.rate != accepted) {
+    failure failed = run_ffmpeg(task, stop_fd, check, fd);
+    const int32_t accepted = std::clamp<int32_t>(rate, TAVO_MIN_RATE, TAVO_MAX_RATE);
+    if (rate > 0 && rate != accepted) {
         task.arguments.insert(task.arguments.begin(), {"-ar", std::to_string(accepted)});
-        failed = run();
+        close_fd(fd);
+        rate = 0;
+        failed = run_ffmpeg(task, stop_fd, check, fd);
     }
-    if (!failed && sound.rate == 0) failed = {"ffmpeg decodes nothing of it."};
+    if (!failed && rate == 0) failed = {"ffmpeg decodes nothing of it."};
     if (failed) {
-        close_fd(sound.fd);
+        close_fd(fd);
     } else {
-        song = song_at(sound.fd, source_fd, true);
+        song = song_at(fd, source_fd, true);
     }
     return failed;
 }

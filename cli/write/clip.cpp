@@ -6,6 +6,7 @@
 #include <filesystem>
 
 #include "cli/input/ffmpeg.h"
+#include "cli/system.h"
 #include "cli/write/file_names.h"
 #include "cli/write/output_file.h"
 #include "cli/write/value_text.h"
@@ -77,8 +78,10 @@ failure write_clip(const record &result, const options &opts, const std::string 
         "-map",          "0:a:0",  "-af",  cut_filter(result, opts),
         "-map_chapters", "-1",     "-b:a", kBitRate,
         "-progress",     "pipe:1", "-y",   "file:" + file.temporary};
-    failure failed = run_ffmpeg({opts.ffmpeg, result.file, song.source_fd, words}, stop_fd,
-                                [](std::string_view) { return failure(); });
+    int progress = -1;
+    failure failed =
+        run_ffmpeg({opts.ffmpeg, result.file, song.source_fd, words}, stop_fd, nullptr, progress);
+    close_fd(progress);
     if (!failed) return commit_output(file, opts.force);
     const size_t at = failed.sentence.find(file.temporary);
     if (at != std::string::npos) {
