@@ -62,10 +62,6 @@ int find_read_error(const std::string &path) {
     return code;
 }
 
-std::string unreadable(int code) {
-    return system_sentence("The file cannot be read", code);
-}
-
 // Returns a sentence that explains a result of tavo_probe.
 std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream) {
     const kind_text &text = kKinds[static_cast<size_t>(kind)];
@@ -171,11 +167,14 @@ std::string explain_refusal(const std::string &path, int32_t code, const TAVO_ST
     file_kind kind = file_kind::unknown;
     int read_error = recognise(path, kind);
     if (read_error == 0 && stream.rate == 0) read_error = find_read_error(path);
-    return read_error != 0 ? unreadable(read_error) : explain_code(kind, code, stream);
+    if (read_error == 0) return explain_code(kind, code, stream);
+    return system_sentence("The file cannot be read", read_error);
 }
 
 std::string explain_lost_audio(const std::string &path, bool has_audio) {
-    if (const int code = find_read_error(path)) return unreadable(code);
+    if (const int code = find_read_error(path)) {
+        return system_sentence("The file cannot be read", code);
+    }
     return has_audio ? "The file could not be read to its end."
                      : "No audio could be decoded from the file.";
 }

@@ -15,7 +15,7 @@ namespace {
 
 using std::chrono::steady_clock;
 
-constexpr std::chrono::seconds kStopPatience{1};
+constexpr std::chrono::milliseconds kStopPatience{900};
 
 // Runs in the new process. Closes its copies of the other workers' sockets, because otherwise those
 // workers would not notice the end of the command.

@@ -49,7 +49,7 @@ struct process_pool {
 bool assign(process_pool &pool, input &next);
 
 // Asks the workers to end. With is_stop they abort their analyses, and are killed if they have not
-// ended after one second. Call it once; no input may be assigned afterwards.
+// ended within a second. Call it once; no input may be assigned afterwards.
 void end_workers(process_pool &pool, bool is_stop);
 
 // Waits until a worker has replied or ended, one of the descriptors in `watched` is ready, a signal

@@ -5,12 +5,12 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <cstdint>
 #include <cstdlib>
 #include <exception>
-#include <fstream>
-#include <iterator>
 #include <nlohmann/json.hpp>
 
+#include "cli/input/recognise.h"
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
 #include "cli/system.h"
@@ -70,17 +70,12 @@ record read_stored(const input &next, const options &opts, int stop_fd, song_fil
     return out;
 }
 
-bool has_content(const std::string &path, const std::string &content) {
-    std::ifstream file(path, std::ios::binary);
-    const std::string there((std::istreambuf_iterator<char>(file)), {});
-    return file && there == content;
-}
-
 failure write_markers(record &result, const options &opts) {
     const std::string target = marker_path(result.file, opts);
     const std::string content = marker_content(result, opts);
     // An earlier command may have left the file, if it was killed before it committed the row.
-    if (!has_content(target, content)) {
+    int code = 0;
+    if (read_bytes(target, 0, INT64_MAX, code) != content) {
         if (failure failed = write_file(target, content, opts.force)) return failed;
     }
     result.written = target;
