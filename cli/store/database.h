@@ -24,27 +24,19 @@ using connection =
     std::function<failure(const std::string &sql, const row &values, const row_reader &on_row)>;
 
 struct database_kind {
-    const char *path_type;  // SQL type names
-    const char *time_type;
-    const char *list_type;
-    const char *time_now;  // SQL for the current second
-    size_t longest_path;   // bytes, limited by the index
-
     const char *version_query;  // selects the version of the store's table, or 0 without a table
     const char *set_version;    // printf format of the statement that sets it
     const char *begin_upgrade;  // begins a transaction that excludes other upgrades of the table
 
+    // Messages do not show a URL's user name and password, that is, what is between :// and the
+    // last @. A location that is only read must exist.
     failure (*open)(const std::string &location, bool read_only, connection &out);
 };
 
 // Finds the kind of database for a store's URL, and the location to pass to its open function.
 failure find_database(const std::string &url, const database_kind **kind, std::string &location);
 
-// Returns the text with *** in place of each word that also occurs in the URL's user name or
-// password, that is, between :// and the last @.
-std::string without_credentials(const std::string &text, const std::string &url);
-
-// Returns null if the program was built without SQLite.
-const database_kind *sqlite_database();
+// In sqlite.cpp; has a null address if the program was built without SQLite.
+extern const database_kind sqlite_database __attribute__((weak));
 
 #endif

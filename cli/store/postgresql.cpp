@@ -2,6 +2,7 @@
 #include <libpq-fe.h>
 
 #include <algorithm>
+#include <cstdint>
 #include <memory>
 #include <string_view>
 
@@ -18,6 +19,15 @@ std::string message_of(const database &db) {
     std::string text = PQerrorMessage(db.get());
     while (!text.empty() && text.back() == '\n') text.pop_back();
     std::replace(text.begin(), text.end(), '\n', ' ');
+    return text;
+}
+
+// Returns the text with *** in place of each occurrence of the word.
+std::string without(std::string text, const std::string &word) {
+    if (word.empty()) return text;
+    for (size_t at = text.find(word); at != std::string::npos; at = text.find(word, at + 3)) {
+        text.replace(at, word.size(), "***");
+    }
     return text;
 }
 
@@ -43,26 +53,26 @@ cell column(const PGresult *result, int line, int index) {
     return std::string(reinterpret_cast<const char *>(raw.get()), size);
 }
 
+// Returns the text form of a BYTEA value.
+std::string hex_text(const std::string &bytes) {
+    constexpr const char *kDigits = "0123456789abcdef";
+    std::string text = "\\x";
+    for (const char byte : bytes) {
+        text += {kDigits[static_cast<uint8_t>(byte) >> 4], kDigits[byte & 0xF]};
+    }
+    return text;
+}
+
 failure run(const database &db, const std::string &sql, const row &values,
             const row_reader &on_row) {
+    row texts = values;
+    if (!texts.empty()) texts[0] = hex_text(values[0].value_or(""));
     std::vector<const char *> data;
-    std::vector<int> sizes;
-    for (const cell &value : values) {
-        data.push_back(value ? value->data() : nullptr);
-        sizes.push_back(value ? static_cast<int>(value->size()) : 0);
-    }
-    // The path is sent as bytes. The other values are sent as text, and the server infers their
-    // types.
-    std::vector<int> formats(values.size());
-    std::vector<Oid> types(values.size());
-    if (!values.empty()) {
-        formats[0] = 1;
-        types[0] = kBytesOid;
-    }
+    for (const cell &text : texts) data.push_back(text ? text->c_str() : nullptr);
     const std::unique_ptr<PGresult, decltype(&PQclear)> result(
         values.empty() ? PQexec(db.get(), sql.c_str())
-                       : PQexecParams(db.get(), sql.c_str(), static_cast<int>(values.size()),
-                                      types.data(), data.data(), sizes.data(), formats.data(), 0),
+                       : PQexecParams(db.get(), sql.c_str(), static_cast<int>(data.size()), nullptr,
+                                      data.data(), nullptr, nullptr, 0),
         PQclear);
     const ExecStatusType status = PQresultStatus(result.get());
     if (status != PGRES_COMMAND_OK && status != PGRES_TUPLES_OK) {
@@ -78,9 +88,27 @@ failure run(const database &db, const std::string &sql, const row &values,
     return {};
 }
 
-failure open_server(const std::string &location, bool /*read_only*/, connection &out) {
-    const database db(PQconnectdb(location.c_str()), PQfinish);
-    if (PQstatus(db.get()) != CONNECTION_OK) return {message_of(db)};
+// True if libpq finds the end of the password at the last @. Otherwise libpq's messages may quote
+// parts of the password.
+bool is_valid(const std::string &url, size_t last_at) {
+    if (url.find_first_of("/@", url.find("://") + 3) < last_at) return false;
+    const std::unique_ptr<PQconninfoOption, decltype(&PQconninfoFree)> options(
+        PQconninfoParse(url.c_str(), nullptr), PQconninfoFree);
+    return options != nullptr;
+}
+
+failure open_server(const std::string &url, bool /*read_only*/, connection &out) {
+    const size_t last_at = url.rfind('@');
+    const bool has_user = last_at != std::string::npos;
+    if (has_user && !is_valid(url, last_at)) {
+        return {"the URL is not valid; a user name or password has %2F, %40 and %25 for / @ and %",
+                true};
+    }
+    const database db(PQconnectdb(url.c_str()), PQfinish);
+    if (PQstatus(db.get()) != CONNECTION_OK) {
+        const char *user = has_user ? PQuser(db.get()) : nullptr;
+        return {without(message_of(db), user == nullptr ? "" : user)};
+    }
     PQsetNoticeProcessor(
         db.get(), [](void *, const char *) {}, nullptr);
     out = [db](const std::string &sql, const row &values, const row_reader &on_row) {
@@ -91,10 +119,8 @@ failure open_server(const std::string &location, bool /*read_only*/, connection 
 
 }  // namespace
 
-// The command finds this record by its name. The length of a path is limited because an index entry
-// may take at most a third of an 8-KiB page.
+// The command finds this record by its name.
 extern "C" const database_kind tavo_postgresql_database = {
-    "BYTEA", "TIMESTAMPTZ", "JSON", "date_trunc('second', now())", 2600,
     // Reading pg_class makes the server notice a table that another command has just created.
     "SELECT coalesce((SELECT substring(obj_description(oid, 'pg_class') FROM 'version ([0-9]+)') "
     "FROM pg_class WHERE oid = to_regclass('songs')), '0')::int",

@@ -19,6 +19,8 @@ using nlohmann::json;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 
+// In bytes. An index entry of PostgreSQL may take at most a third of an 8-KiB page.
+constexpr size_t kLongestPath = 2600;
 constexpr size_t kBatchRows = 100;
 constexpr milliseconds kBatchAge{2000};
 constexpr int64_t kFirstWaitMs = 500;  // doubled each time
@@ -62,25 +64,19 @@ constexpr const char *kStatusQuery =
     "SELECT status FROM songs WHERE path = $1 AND mode = $2 AND length_s = $3 AND max_beats = $4 "
     "AND size = $5 AND mtime_ns = $6";
 
-// Returns the statements that create the table if it is missing, add the columns of version 2 and
-// set the version.
-std::vector<std::string> upgrade_statements(const database_kind &kind) {
-    const std::string table =
-        "CREATE TABLE IF NOT EXISTS songs (path " + std::string(kind.path_type) +
-        " NOT NULL, mode TEXT NOT NULL, length_s INTEGER NOT NULL, max_beats INTEGER NOT NULL, "
-        "size BIGINT NOT NULL, mtime_ns BIGINT NOT NULL, status TEXT NOT NULL, sentence TEXT, "
-        "sample_rate INTEGER, channels INTEGER, duration_ms BIGINT, hl_pos_ms INTEGER, hl_end_ms "
-        "BIGINT, hl_refined INTEGER, bpm INTEGER, beats_ms " +
-        kind.list_type + ", cpu_ms BIGINT, version TEXT NOT NULL, host TEXT NOT NULL, finished " +
-        kind.time_type + " NOT NULL, PRIMARY KEY (" + kKey + "))";
-    return {table, "ALTER TABLE songs ADD COLUMN offset_ms DOUBLE PRECISION",
-            "ALTER TABLE songs ADD COLUMN decoder TEXT",
-            formatted(kind.set_version, kTableVersion)};
-}
+// The types are PostgreSQL's. SQLite accepts them, and every column takes any value there.
+constexpr const char *kCreateTable =
+    "CREATE TABLE IF NOT EXISTS songs (path BYTEA NOT NULL, mode TEXT NOT NULL, "
+    "length_s INTEGER NOT NULL, max_beats INTEGER NOT NULL, size BIGINT NOT NULL, "
+    "mtime_ns BIGINT NOT NULL, status TEXT NOT NULL, sentence TEXT, sample_rate INTEGER, "
+    "channels INTEGER, duration_ms BIGINT, hl_pos_ms INTEGER, hl_end_ms BIGINT, "
+    "hl_refined INTEGER, bpm INTEGER, beats_ms JSON, cpu_ms BIGINT, version TEXT NOT NULL, "
+    "host TEXT NOT NULL, finished TIMESTAMPTZ NOT NULL, "
+    "PRIMARY KEY (path, mode, length_s, max_beats))";
 
 // Returns the statement that inserts a row or replaces the row with the same key. The values are
 // the key, the size, the modification time and the cells of append_result_cells.
-std::string put_statement(const database_kind &kind) {
+std::string put_statement() {
     std::vector<std::string> others = {"size", "mtime_ns"};
     for (const result_column &column : kResultColumns) others.emplace_back(column.name);
     others.insert(others.end(), {"version", "host"});
@@ -92,8 +88,8 @@ std::string put_statement(const database_kind &kind) {
         values += ", $" + std::to_string(i + 5);
         changes += ", " + others[i] + " = excluded." + others[i];
     }
-    return "INSERT INTO songs (" + names + ", finished) VALUES (" + values + ", " + kind.time_now +
-           ") ON CONFLICT (" + kKey + ") DO UPDATE SET " + changes;
+    return "INSERT INTO songs (" + names + ", finished) VALUES (" + values +
+           ", CURRENT_TIMESTAMP) ON CONFLICT (" + kKey + ") DO UPDATE SET " + changes;
 }
 
 // Returns the query for the next songs after a path, in the order of their paths. $1 to $4 are the
@@ -132,9 +128,6 @@ bool read_value(const std::string &text, column_type type, json &value) {
         value = as_utf8(text);
         return true;
     }
-    // A nested list means a damaged row. It is not parsed, because it may be very deep.
-    const size_t last_bracket = text.find_last_of("[{");
-    if (last_bracket != std::string::npos && last_bracket > 0) return false;
     value = json::parse(text, nullptr, false);
     if (type == column_type::whole) return value.is_number_integer();
     if (type == column_type::real) return value.is_number();
@@ -154,7 +147,6 @@ stored_song song_of(const row &cells, int32_t mode) {
                        " cannot be read."};
         return song;
     }
-    if (object.contains("bpm") && !object.contains("beats_ms")) object["beats_ms"] = json::array();
     song.result = object.dump();
     return song;
 }
@@ -163,10 +155,6 @@ stored_song song_of(const row &cells, int32_t mode) {
 
 failure connect(store &db) {
     return db.run ? failure() : db.kind->open(db.location, db.opts.from_store, db.run);
-}
-
-std::string public_text(const store &db, const failure &failed) {
-    return shown(without_credentials(failed.sentence, db.opts.store));
 }
 
 // Connects and does the work. After a temporary failure, retries both for at most --patience.
@@ -179,17 +167,15 @@ failure persist(store &db, const std::function<failure()> &work) {
         db.run = nullptr;
         const auto left = std::chrono::seconds(db.opts.patience_s) - (steady_clock::now() - start);
         const int64_t left_ms = std::chrono::duration_cast<milliseconds>(left).count();
-        const std::string reason = public_text(db, failed);
-        bool may_retry = !failed.is_permanent && left_ms > 0;
-        if (may_retry) {
+        const std::string reason = shown(failed.sentence);
+        if (!failed.is_permanent && left_ms > 0) {
             wait_ms = std::min(wait_ms, left_ms);
             fprintf(stderr, "tavo: the store does not answer (%s); trying again in %.1f s.\n",
                     reason.c_str(), static_cast<double>(wait_ms) / 1000.0);
             const auto end = steady_clock::now() + milliseconds(wait_ms);
             while (stop_signal() == 0 && steady_clock::now() < end) usleep(kSliceUs);
-            may_retry = stop_signal() == 0;
+            if (stop_signal() == 0) continue;
         }
-        if (may_retry) continue;
         db.has_failed = true;
         return {"the store is given up: " + reason + "."};
     }
@@ -203,14 +189,17 @@ failure read_version(store &db) {
 
 // Creates the table or adds missing columns, in one transaction.
 failure upgrade(store &db) {
-    failure failed = db.run(db.kind->begin_upgrade, {}, nullptr);
-    if (!failed) failed = read_version(db);  // another command may have upgraded it meanwhile
-    if (!failed && db.version < kTableVersion) {
-        for (const std::string &statement : upgrade_statements(*db.kind)) {
-            if (!failed) failed = db.run(statement, {}, nullptr);
-        }
+    if (failure failed = db.run(db.kind->begin_upgrade, {}, nullptr)) return failed;
+    // Another command may have upgraded the table meanwhile.
+    if (failure failed = read_version(db)) return failed;
+    if (db.version == kTableVersion) return db.run("COMMIT", {}, nullptr);
+    const std::string set_version = formatted(db.kind->set_version, kTableVersion);
+    for (const char *sql :
+         {kCreateTable, "ALTER TABLE songs ADD COLUMN offset_ms DOUBLE PRECISION",
+          "ALTER TABLE songs ADD COLUMN decoder TEXT", set_version.c_str(), "COMMIT"}) {
+        if (failure failed = db.run(sql, {}, nullptr)) return failed;
     }
-    return failed ? failed : db.run("COMMIT", {}, nullptr);
+    return {};
 }
 
 failure open_table(store &db) {
@@ -236,7 +225,7 @@ row values_of(const store &db, const std::string &path, const file_state &file) 
 }
 
 failure write_batch(const store &db) {
-    const std::string sql = put_statement(*db.kind);
+    const std::string sql = put_statement();
     if (failure failed = db.run("BEGIN", {}, nullptr)) return failed;
     for (const stored_song &song : db.batch) {
         row values = values_of(db, song.path, song.file);
@@ -285,7 +274,7 @@ failure open_store(store &db, const options &opts) {
     if (failure failed = find_database(opts.store, &db.kind, db.location)) return failed;
     const failure failed = open_table(db);
     if (!failed) return {};
-    return {"The store cannot be used: " + public_text(db, failed) + "."};
+    return {"The store cannot be used: " + shown(failed.sentence) + "."};
 }
 
 failure find_song(store &db, const std::string &path, file_state &file, bool &is_new) {
@@ -309,7 +298,7 @@ failure find_song(store &db, const std::string &path, file_state &file, bool &is
 
 failure add_song(store &db, stored_song &&song) {
     if (db.kind == nullptr || song.result.empty()) return {};
-    if (song.path.size() > db.kind->longest_path) {
+    if (song.path.size() > kLongestPath) {
         return {shown(song.path) + ": the name is too long for the store."};
     }
     if (db.batch.empty()) db.batch_since = steady_clock::now();
