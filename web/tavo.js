@@ -109,7 +109,6 @@ function show(entry) {
   shown = entry;
   entry.song.audio = URL.createObjectURL(entry.file);
   const data = JSON.stringify(entry.song).replace(/</g, "\\u003c");
-  const title = entry.file.name.replace(/&/g, "&amp;").replace(/</g, "&lt;");
   const frame = byId("song");
   byId("view").hidden = false;
   frame.onload = () => {
@@ -119,7 +118,7 @@ function show(entry) {
     frame.contentDocument.getElementById("timeline").focus();
     byId("view").scrollIntoView();
   };
-  frame.srcdoc = songPage.replace("@DATA@", () => data).replace("@TITLE@", () => title);
+  frame.srcdoc = songPage.replace("@DATA@", () => data);
 }
 
 async function saveMarkers() {

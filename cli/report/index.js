@@ -1,34 +1,60 @@
-// The index of songs: sorts them by a column and filters them by name.
+// The index of songs: sorts them by a column and filters them by name. A line of the data is a song;
+// one that failed has only a name and an error.
+const songs = JSON.parse(`[${byId("data").textContent.trim().replaceAll("\n", ",")}]`);
 const body = document.querySelector("#songs tbody");
 const heads = [...document.querySelectorAll("#songs thead th")];
+const keys = ["name", "duration_ms", "bpm", "hl_pos_ms", "beats"];  // values of the columns
 
-// Returns a function that compares rows by the text of the first column or by the data-value of any
-// other column. Rows without a data-value come last.
-function compare(column, sign) {
-  return (a, b) => {
-    const [x, y] = [a.cells[column], b.cells[column]];
-    const [p, q] = [x && x.dataset.value, y && y.dataset.value];
-    if (column > 0 && (p === undefined || q === undefined)) return (p === undefined) - (q === undefined);
-    return sign * (column > 0 ? p - q : x.textContent.localeCompare(y.textContent, undefined, { numeric: true }));
+function miniature(loudness) {
+  const picture = shape("svg", { viewBox: "0 0 140 28", role: "img", "aria-label": "Loudness" }, null);
+  const top = Math.max(...loudness, 1e-9), step = 140 / Math.max(loudness.length - 1, 1);
+  const points = loudness.map((value, k) => `${(k * step).toFixed(1)} ${(27 - value / top * 26).toFixed(1)}`);
+  if (points.length > 1) shape("path", { class: "loud", d: "M" + points.join("L") }, picture);
+  return picture;
+}
+
+for (const song of songs) {
+  song.row = body.insertRow();
+  const add = (kind, content) => {
+    const cell = song.row.insertCell();
+    cell.className = kind;
+    cell.append(content);
+    return cell;
   };
+  if (song.error) {
+    add("name", song.name);
+    add("", song.error).colSpan = 5;
+    continue;
+  }
+  add("name", Object.assign(element("a", song.name), { href: song.page }));
+  add("number", clock(song.duration_ms));
+  add("number", song.bpm ?? "");
+  add("number", song.hl_pos_ms === undefined ? "" : clock(song.hl_pos_ms));
+  add("number", song.beats ?? "");
+  add("", miniature(song.loudness));
 }
 
 function sortBy(column) {
   const sign = heads[column].getAttribute("aria-sort") === "ascending" ? -1 : 1;
   for (const head of heads) head.removeAttribute("aria-sort");
   heads[column].setAttribute("aria-sort", sign > 0 ? "ascending" : "descending");
-  body.append(...[...body.rows].sort(compare(column, sign)));
+  const order = new Intl.Collator(undefined, { numeric: true });
+  songs.sort((a, b) => {
+    const [p, q] = [a[keys[column]], b[keys[column]]];
+    if (p === undefined || q === undefined) return (p === undefined) - (q === undefined);  // missing values last
+    return sign * (column === 0 ? order.compare(p, q) : p - q);
+  });
+  body.append(...songs.map((song) => song.row));
 }
 
 function search(words) {
   const sought = words.toLowerCase().split(/\s+/);
   let shown = 0;
-  for (const row of body.rows) {
-    const name = row.cells[0].textContent.toLowerCase();
-    row.hidden = !sought.every((word) => name.includes(word));
+  for (const { name, row } of songs) {
+    row.hidden = !sought.every((word) => name.toLowerCase().includes(word));
     shown += row.hidden ? 0 : 1;
   }
-  byId("status").textContent = `${shown} of ${body.rows.length} songs`;
+  byId("status").textContent = `${shown} of ${songs.length} songs`;
 }
 
 heads.forEach((head, column) => {

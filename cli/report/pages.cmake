@@ -1,14 +1,12 @@
 # Generates report_pages.cpp: the two pages of --report, with their style and scripts, as arrays of strings. Each page
-# is split where the command inserts text.
+# is split where the command inserts its data.
 set(here ${CMAKE_CURRENT_LIST_DIR})
 set(parts page.css song.html shared.js song.js index.html index.js)
 list(TRANSFORM parts PREPEND ${here}/)
 set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${parts})
 set(report_pages ${CMAKE_CURRENT_BINARY_DIR}/report_pages.cpp)
 
-foreach(key TITLE DATA ROWS)
-  set(${key} ")page\", R\"page(")
-endforeach()
+set(DATA ")page\", R\"page(")
 file(READ ${here}/page.css STYLE)
 file(READ ${here}/shared.js shared)
 foreach(page song index)
@@ -18,7 +16,7 @@ foreach(page song index)
   file(READ ${CMAKE_CURRENT_BINARY_DIR}/${page}.html ${page}_page)
 endforeach()
 file(CONFIGURE OUTPUT ${report_pages} @ONLY CONTENT [[
-extern const char *const kSongPage[3];
+extern const char *const kSongPage[2];
 extern const char *const kIndexPage[2];
 const char *const kSongPage[] = {R"page(@song_page@)page"};
 const char *const kIndexPage[] = {R"page(@index_page@)page"};

@@ -15,6 +15,14 @@ function element(name, ...content) {
   return made;
 }
 
+// Returns a new SVG element, appended to the parent unless that is null.
+function shape(name, attributes, parent) {
+  const made = document.createElementNS("http://www.w3.org/2000/svg", name);
+  for (const key in attributes) made.setAttribute(key, attributes[key]);
+  if (parent !== null) parent.append(made);
+  return made;
+}
+
 function download(name, type, content) {
   const link = element("a");
   link.href = URL.createObjectURL(new Blob([content], { type }));

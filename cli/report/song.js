@@ -1,51 +1,45 @@
 // Draws a song's result on a time axis, in player time (ms), and plays the song.
-const song = JSON.parse(document.getElementById("data").textContent);
+const song = JSON.parse(byId("data").textContent);
 const beats = song.beats_ms || [];
+song.length_ms = Math.max(song.sound_ms + song.read_ms, song.hl_pos_ms || 0, ...beats.slice(-1));
 const hasHighlight = song.hl_pos_ms !== undefined;
 const loopEnd = hasHighlight ? Math.min(song.region_end_ms, song.length_ms) : 0;
 const timeline = byId("timeline");
 const svg = timeline.querySelector("svg");
 const view = { from: 0, to: song.length_ms };
 
-function shape(name, attributes, parent = svg) {
-  const made = document.createElementNS("http://www.w3.org/2000/svg", name);
-  for (const key in attributes) made.setAttribute(key, attributes[key]);
-  if (parent !== null) parent.append(made);
-  return made;
-}
-
 function line(kind, x, top, bottom) {
-  return shape("line", { class: kind, x1: x, x2: x, y1: top, y2: bottom });
+  return shape("line", { class: kind, x1: x, x2: x, y1: top, y2: bottom }, svg);
 }
 
 // ---- The picture. x is a time in ms, y a percentage of the height. Zooming only changes the view box.
 
 function drawWave() {
   const count = song.wave.length / 2;
-  if (count === 0) return;
   const step = song.read_ms / count;
   const x = (k) => (song.sound_ms + (k + .5) * step).toFixed(1);
   const y = (value) => (24 - value * 22 / 127).toFixed(2);
   let path = "";
   for (let k = 0; k < count; ++k) path += `${k ? "L" : "M"}${x(k)} ${y(song.wave[2 * k + 1])}`;
   for (let k = count; k-- > 0;) path += `L${x(k)} ${y(song.wave[2 * k])}`;
-  shape("path", { class: "wave", d: path + "Z" });
+  shape("path", { class: "wave", d: path + "Z" }, svg);
 }
 
 function drawLoudness() {
   byId("loudname").hidden = song.loudness.length === 0;
-  const top = Math.max(...song.loudness, song.mean, 1e-9);
+  if (song.loudness.length === 0) return;
+  const top = Math.max(...song.loudness, 1e-9);
   const y = (value) => (79 - value / top * 29).toFixed(2);
   // Each value is drawn in the middle of its 6-second window.
   const points = song.loudness.map((value, k) => `${song.sound_ms + 2000 * k + 3000} ${y(value)}`);
-  if (points.length === 0) return;
-  shape("path", { class: "loud", d: "M" + points.join("L") });
-  shape("line", { class: "mean", x1: 0, x2: song.length_ms, y1: y(song.mean), y2: y(song.mean) });
+  shape("path", { class: "loud", d: "M" + points.join("L") }, svg);
+  const mean = y(song.loudness.reduce((sum, value) => sum + value) / song.loudness.length);
+  shape("line", { class: "mean", x1: 0, x2: song.length_ms, y1: mean, y2: mean }, svg);
 }
 
 function box(kind, from, to) {
   const end = Math.max(from, to);
-  shape("path", { class: kind, d: `M${from} 0L${end} 0L${end} 100L${from} 100Z` });
+  shape("path", { class: kind, d: `M${from} 0L${end} 0L${end} 100L${from} 100Z` }, svg);
 }
 
 if (song.searched_ms) {
@@ -351,7 +345,7 @@ function fact(words, value, isCopied = false) {
   byId("facts").append(item);
 }
 
-byId("name").textContent = song.name;
+document.title = byId("name").textContent = song.name;
 timeline.setAttribute("aria-valuemax", Math.floor(song.length_ms / 1000));
 fact("length", clock(song.duration_ms));
 fact("", `${song.sample_rate} Hz, ${song.channels} ${song.channels === 1 ? "channel" : "channels"}`);

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <climits>
 #include <cmath>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -17,60 +16,11 @@
 namespace {
 
 constexpr int32_t kBlockSamples = 4096;
-constexpr size_t kColumns = 4000;    // columns of the time axis: sharp when zoomed, about 30 KB
-constexpr size_t kMostBins = 16384;  // several per column, for sharp edges
+constexpr size_t kColumns = 4000;  // of the waveform: sharp when zoomed, about 30 KB
 constexpr double kHopMs = int{TAVO_LOUDNESS_HOP_MS};
 constexpr double kWindowMs = int{TAVO_LOUDNESS_WINDOW_MS};
-constexpr size_t kWindowHops = TAVO_LOUDNESS_WINDOW_MS / TAVO_LOUDNESS_HOP_MS;
 
-// The lowest and the highest sample of a span.
-struct extent {
-    int16_t low = INT16_MAX;
-    int16_t high = INT16_MIN;
-};
-
-struct sound {
-    int64_t samples_per_hop = 0;
-    int64_t samples = 0;
-    std::vector<extent> bins;  // equally long
-    int64_t samples_per_bin = 1;
-    int64_t bin_rest = 0;      // samples that the last bin still lacks
-    std::vector<double> hops;  // sums of the squares of the samples
-    int64_t hop_rest = 0;      // samples that the last hop still lacks
-};
-
-extent merged(const extent &a, const extent &b) {
-    return {std::min(a.low, b.low), std::max(a.high, b.high)};
-}
-
-// Merges pairs of bins once there are too many. The length of a bin cannot be chosen in advance,
-// because a file may state a wrong duration.
-void halve_bins(sound &song) {
-    for (size_t i = 0; i < kMostBins / 2; ++i) {
-        song.bins[i] = merged(song.bins[2 * i], song.bins[2 * i + 1]);
-    }
-    song.bins.resize(kMostBins / 2);
-    song.samples_per_bin *= 2;
-}
-
-void add_sample(sound &song, int16_t sample) {
-    if (song.bin_rest == 0) {
-        song.bins.emplace_back();
-        song.bin_rest = song.samples_per_bin;
-    }
-    if (song.hop_rest == 0) {
-        song.hops.push_back(0.0);
-        song.hop_rest = song.samples_per_hop;
-    }
-    const double level = sample / 32767.0;
-    song.bins.back() = merged(song.bins.back(), {sample, sample});
-    song.hops.back() += level * level;
-    ++song.samples;
-    --song.hop_rest;
-    if (--song.bin_rest == 0 && song.bins.size() == kMostBins) halve_bins(song);
-}
-
-failure read_samples(const std::string &path, int stop_fd, sound &song) {
+failure read_samples(const std::string &path, int stop_fd, std::vector<int16_t> &samples) {
     const mtsrc_param param{path.c_str()};
     int32_t code = 0;
     const std::unique_ptr<mtsrc_ctx, decltype(&mtsrc_deinit)> source(mtsrc_init(&param, &code),
@@ -81,47 +31,37 @@ failure read_samples(const std::string &path, int stop_fd, sound &song) {
         mtsrc_frame frame = {block.data(), 0};
         code = mtsrc_getstream(source.get(), static_cast<int32_t>(sizeof block), &frame);
         if (code < 0) break;
-        for (size_t i = 0; i < static_cast<size_t>(frame.size) / sizeof block[0]; ++i) {
-            add_sample(song, block[i]);
-        }
+        const size_t count = static_cast<size_t>(frame.size) / sizeof block[0];
+        samples.insert(samples.end(), block.data(), block.data() + count);
     }
-    if (song.samples == 0) return {"The sound could not be read again for the page."};
-    if (song.hop_rest > 0) song.hops.pop_back();  // incomplete
-    return {};
+    return {samples.empty() ? "The sound could not be read again for the page." : ""};
 }
 
-// Returns the lowest and the highest sample of each column of a time axis, scaled to a peak of 127.
-// A column covers every bin that it overlaps. The last column contains the last sample.
-result_json wave_of(const sound &song, double axis_samples) {
-    int peak = 1;
-    for (const extent &bin : song.bins) peak = std::max({peak, -bin.low, +bin.high});
-    const double bins_per_column =
-        axis_samples / kColumns / static_cast<double>(song.samples_per_bin);
+// Returns the lowest and the highest sample of each column, scaled to a peak of 127.
+result_json wave_of(const std::vector<int16_t> &samples) {
+    const auto whole = std::minmax_element(samples.begin(), samples.end());
+    const double scale = 127.0 / std::max({1, -*whole.first, +*whole.second});
     result_json wave = result_json::array();
     for (size_t k = 0; k < kColumns; ++k) {
-        const auto first = static_cast<size_t>(static_cast<double>(k) * bins_per_column);
-        const auto end =
-            static_cast<size_t>(std::ceil(static_cast<double>(k + 1) * bins_per_column));
-        if (first >= song.bins.size()) break;
-        extent column = song.bins[first];
-        for (size_t i = first + 1; i < std::min(end, song.bins.size()); ++i) {
-            column = merged(column, song.bins[i]);
-        }
-        wave.push_back(std::lround(column.low * (127.0 / peak)));
-        wave.push_back(std::lround(column.high * (127.0 / peak)));
+        const size_t start = k * samples.size() / kColumns;
+        const size_t end = std::max(start + 1, (k + 1) * samples.size() / kColumns);
+        const auto [low, high] = std::minmax_element(samples.data() + start, samples.data() + end);
+        wave.push_back(std::lround(*low * scale));
+        wave.push_back(std::lround(*high * scale));
     }
     return wave;
 }
 
-// Returns the loudness curve, computed with the formula of tavo_get_loudness. A window consists of
-// whole hops.
-std::vector<float> loudness_of(const sound &song) {
+// Returns the loudness curve, computed with the formula of tavo_get_loudness.
+std::vector<float> loudness_of(const std::vector<int16_t> &samples, int32_t rate) {
+    const size_t hop = static_cast<size_t>(rate) * TAVO_LOUDNESS_HOP_MS / 1000;
+    const size_t window = hop * (TAVO_LOUDNESS_WINDOW_MS / TAVO_LOUDNESS_HOP_MS);
+    const double full_scale = 32767.0 * 32767.0 * static_cast<double>(window);
     std::vector<float> values;
-    const double samples = static_cast<double>(song.samples_per_hop) * kWindowHops;
-    for (size_t i = 0; i + kWindowHops <= song.hops.size(); ++i) {
-        const auto *first = song.hops.data() + i;
-        const double sum = std::accumulate(first, first + kWindowHops, 0.0);
-        values.push_back(static_cast<float>(10.0 * std::log10(sum / samples + 1.0)));
+    for (size_t start = 0; start + window <= samples.size(); start += hop) {
+        const int16_t *first = samples.data() + start;
+        const double sum = std::inner_product(first, first + window, first, 0.0);
+        values.push_back(static_cast<float>(10.0 * std::log10(sum / full_scale + 1.0)));
     }
     return values;
 }
@@ -161,28 +101,18 @@ void add_result(const record &result, result_json &view) {
 
 failure read_song_view(const record &result, int stop_fd, result_json &view) {
     const int32_t rate = result.sample_rate;
-    sound song;
-    song.samples_per_hop = int64_t{rate} * TAVO_LOUDNESS_HOP_MS / 1000;
-    if (failure failed = read_samples(result.sound_path, stop_fd, song)) return failed;
-
-    const double read_ms = 1000.0 * static_cast<double>(song.samples) / rate;
-    double length_ms = std::max(read_ms, static_cast<double>(result.hl_pos_ms));
-    for (const float beat : result.beats_ms) {
-        length_ms = std::max(length_ms, static_cast<double>(beat));
-    }
-    const std::vector<float> loudness = loudness_of(song);
-    const double sum = std::accumulate(loudness.begin(), loudness.end(), 0.0);
+    std::vector<int16_t> samples;
+    samples.reserve(static_cast<size_t>(result.duration_ms * rate / 1000));
+    if (failure failed = read_samples(result.sound_path, stop_fd, samples)) return failed;
     view = {{"name", as_utf8(base_name(result.file))},
             {"mode", mode_word(result.mode)},
             {"sample_rate", rate},
             {"channels", result.channels},
             {"duration_ms", result.duration_ms},
-            {"length_ms", player_ms(result, length_ms)},
             {"sound_ms", -result.offset_ms},
-            {"read_ms", read_ms},
-            {"wave", wave_of(song, length_ms * rate / 1000.0)},
-            {"loudness", loudness},
-            {"mean", loudness.empty() ? 0.0 : sum / static_cast<double>(loudness.size())}};
+            {"read_ms", 1000.0 * static_cast<double>(samples.size()) / rate},
+            {"wave", wave_of(samples)},
+            {"loudness", loudness_of(samples, rate)}};
     add_result(result, view);
     return {};
 }

@@ -13,10 +13,10 @@
 // requests a stop.
 //
 // The view receives values of the result and the following. "wave" has the lowest and the highest
-// sample of each of up to 4000 columns, scaled to a peak of 127. "loudness" has a value every 2 s,
-// for the 6 s that start there, and "mean" is the mean of these values. All times are player times,
-// so "sound_ms", the time of the first decoded sample, may be negative. The caller adds the sound
-// as "audio" (a URL) or "embedded" (base64).
+// sample of each of 4000 columns, scaled to a peak of 127. "loudness" has a value every 2 s, for
+// the 6 s that start there. All times are player times, so "sound_ms", the time of the first
+// decoded sample, may be negative; "read_ms" is the length of the decoded sound. The caller adds
+// the sound as "audio" (a URL) or "embedded" (base64).
 failure read_song_view(const record &result, int stop_fd, result_json &view);
 
 #endif

@@ -112,18 +112,13 @@ std::string replaced(const std::string &text, const std::map<char, const char *>
     return out;
 }
 
-std::string html_text(const std::string &bytes) {
-    return replaced(as_utf8(bytes),
-                    {{'&', "&amp;"}, {'<', "&lt;"}, {'>', "&gt;"}, {'"', "&quot;"}});
-}
-
 std::string xml_text(const std::string &bytes) {
     std::string allowed;
     for (const character &each : characters_of(bytes)) {
         const bool is_allowed = each.point >= 0x20 && each.point != 0xFFFE && each.point != 0xFFFF;
         allowed += is_allowed ? each.bytes : kReplacement;
     }
-    return html_text(allowed);
+    return replaced(allowed, {{'&', "&amp;"}, {'<', "&lt;"}, {'>', "&gt;"}, {'"', "&quot;"}});
 }
 
 std::string percent_encoded(const std::string &bytes) {

@@ -1,4 +1,4 @@
-// Converts file names, which may contain any bytes, to readable text, JSON, pages and URLs.
+// Converts file names, which may contain any bytes, to readable text, JSON, XML and URLs.
 #ifndef TAVO_CLI_WRITE_FILE_NAMES_H
 #define TAVO_CLI_WRITE_FILE_NAMES_H
 
@@ -19,9 +19,8 @@ std::string as_utf8(const std::string &bytes);
 // Replaces each character that has a replacement.
 std::string replaced(const std::string &text, const std::map<char, const char *> &replacements);
 
-// Return valid UTF-8 with entities for the characters & < > and ". xml_text also writes U+FFFD in
-// place of characters that XML forbids.
-std::string html_text(const std::string &bytes);
+// Returns valid UTF-8 with entities for the characters & < > and ", and with U+FFFD in place of
+// characters that XML forbids.
 std::string xml_text(const std::string &bytes);
 
 // Encodes every byte except A-Z a-z 0-9 - . _ ~ / as %NN.

@@ -115,7 +115,7 @@ class Report(Browser):
         wave = page["wave"]  # pairs for 4000 columns of 2.5 ms; the wave starts at column 1600
         self.assertEqual((len(wave), {*wave[:3198]}, {*wave[3202:]}), (8000, {0}, {-127, 127}))
         # The square wave fills a third of the first window, two thirds of the second and all of the third.
-        for value, expected in zip([*page["loudness"], page["mean"]], (0.348, 0.669, 0.969, 0.662), strict=True):
+        for value, expected in zip(page["loudness"], (0.348, 0.669, 0.969), strict=True):
             self.assertAlmostEqual(value, expected, delta=0.001)
         for seconds, searched in ((60, [0, 42000]), (100, [18000, 52000])):
             self.put("song.wav", source=song(seconds=seconds, bpm=120, rate=8000, channels=1))
