@@ -1,7 +1,5 @@
 #include "cli/report/report.h"
 
-#include <sys/stat.h>
-
 #include <cinttypes>
 #include <cstdint>
 #include <filesystem>
@@ -89,10 +87,6 @@ failure check_report(const std::string &target, bool force) {
     file_kind kind = file_kind::unknown;
     if (recognise(target, kind) == 0 && kind != file_kind::unknown) {
         return {"The page " + shown(target) + " would replace a song."};
-    }
-    struct stat info {};
-    if (lstat(target.c_str(), &info) == 0 && !S_ISREG(info.st_mode) && !S_ISDIR(info.st_mode)) {
-        return {"The page " + shown(target) + " cannot be written: it is not a regular file."};
     }
     return check_target(target, force);
 }

@@ -17,7 +17,7 @@
 // folder.
 std::string report_page_path(const options &opts, uint64_t index, const std::string &song);
 
-// Checks that a page can be written. A page never replaces a song or a device.
+// Checks that a page can be written. A page never replaces a song.
 failure check_report(const std::string &target, bool force);
 
 // Reads the song's sound, writes its page and stores its index row in `row`. Fails if stop_fd

@@ -1,15 +1,9 @@
 #include "cli/write/click.h"
 
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
 #include <filesystem>
 
 #include "cli/input/recognise.h"
 #include "cli/write/file_names.h"
-#include "cli/write/value_text.h"
 #include "include/tavo.h"
 
 namespace {
@@ -30,17 +24,6 @@ failure begin_click(output_file &track, const options &opts, const std::string &
     if (opts.click.empty()) return {};
     if (same_file(opts.click, input)) {
         return {"The click track would replace the file that is analysed."};
-    }
-    struct stat info {};
-    if (stat(opts.click.c_str(), &info) == 0 && !S_ISREG(info.st_mode)) {
-        const int fd = open(opts.click.c_str(), O_WRONLY | O_CLOEXEC | O_NONBLOCK);
-        if (fd < 0) {
-            return {system_sentence("The click track " + shown(opts.click) + " cannot be written",
-                                    errno)};
-        }
-        close(fd);
-        fnamedec = opts.click.c_str();
-        return {};
     }
     failure failed = check_target(opts.click, opts.force);
     if (!failed) failed = begin_output(track, opts.click);

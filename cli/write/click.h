@@ -11,8 +11,8 @@
 #include "cli/options.h"
 #include "cli/write/output_file.h"
 
-// Called before the job. Points fnamedec (tavo.h) at the temporary file of the track, or at the
-// file that --click names if it is a device or a pipe. Fails if the track would replace the input.
+// Called before the job. Points fnamedec (tavo.h) at the temporary file of the track. Fails if the
+// track would replace the input.
 failure begin_click(output_file &track, const options &opts, const std::string &input);
 
 // Called after the job. Renames a complete track to its target and removes an incomplete one.

@@ -48,7 +48,9 @@ bool same_file(const std::string &a, const std::string &b) {
 failure check_target(const std::string &target, bool force) {
     struct stat info {};
     if (lstat(target.c_str(), &info) == 0) {
-        if (S_ISDIR(info.st_mode)) return write_failure(target, EISDIR);
+        if (!S_ISREG(info.st_mode)) {
+            return {"The file " + shown(target) + " cannot be written: it is not a regular file."};
+        }
         if (!force) return exists_already(target);
     } else if (errno != ENOENT) {
         return write_failure(target, errno);

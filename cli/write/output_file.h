@@ -16,8 +16,8 @@ struct output_file {
 // True if both paths refer to the same existing file.
 bool same_file(const std::string &a, const std::string &b);
 
-// Checks that the target can be written: its folder is writable and, without force, the target
-// does not exist. Creates nothing.
+// Checks that the target can be written: its folder is writable, and the target does not exist or,
+// with force, is a regular file, not a link or a device. Creates nothing.
 failure check_target(const std::string &target, bool force);
 
 // Creates the temporary file. Its name ends in `ending`, for programs that choose a format from the
