@@ -22,7 +22,6 @@
 #include <utility>
 
 #include "cli/system.h"
-#include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
 namespace {

@@ -18,7 +18,6 @@
 #include "cli/input/song_file.h"
 #include "cli/system.h"
 #include "cli/write/clip.h"
-#include "cli/write/file_names.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"

@@ -8,7 +8,6 @@
 #include <numeric>
 
 #include "cli/system.h"
-#include "cli/write/file_names.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"

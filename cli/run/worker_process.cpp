@@ -15,11 +15,11 @@
 #include "cli/run/analyse.h"
 #include "cli/system.h"
 #include "cli/write/clip.h"
-#include "cli/write/file_names.h"
 #include "cli/write/format.h"
 #include "cli/write/json.h"
 #include "cli/write/markers.h"
 #include "cli/write/output_file.h"
+#include "cli/write/value_text.h"
 
 NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(input, index, path, stored)
 NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(reply, status, result, message, json, row)

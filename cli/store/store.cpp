@@ -10,7 +10,6 @@
 #include <nlohmann/json.hpp>
 
 #include "cli/system.h"
-#include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
 namespace {

@@ -3,7 +3,7 @@
 #include <filesystem>
 
 #include "cli/input/recognise.h"
-#include "cli/write/file_names.h"
+#include "cli/write/value_text.h"
 #include "include/tavo.h"
 
 namespace {

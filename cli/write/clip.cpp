@@ -7,7 +7,6 @@
 
 #include "cli/input/ffmpeg.h"
 #include "cli/system.h"
-#include "cli/write/file_names.h"
 #include "cli/write/output_file.h"
 #include "cli/write/value_text.h"
 
@@ -47,13 +46,12 @@ std::string clip_ending(const std::string &input) {
 std::string cut_filter(const record &result, const options &opts) {
     const double start = player_ms(result, result.hl_pos_ms) / 1000;
     const double length = player_ms(result, highlight_end_ms(result, opts.length_s)) / 1000 - start;
-    std::string filter = std::string(kPlayerTimeFilter) +
-                         ",atrim=start=" + formatted("%.6f:duration=%.6f", start, length) +
-                         ",asetpts=PTS-STARTPTS";
+    std::string filter = formatted("%s,atrim=start=%.6f:duration=%.6f,asetpts=PTS-STARTPTS",
+                                   kPlayerTimeFilter, start, length);
     if (opts.fade_s > 0.0) {
         const double fade = std::min(opts.fade_s, length / 2);
-        filter += formatted(",afade=t=in:d=%.6f,afade=t=out:", fade) +
-                  formatted("st=%.6f:d=%.6f", length - fade, fade);
+        filter +=
+            formatted(",afade=t=in:d=%.6f,afade=t=out:st=%.6f:d=%.6f", fade, length - fade, fade);
     }
     return filter;
 }

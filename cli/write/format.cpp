@@ -10,7 +10,6 @@
 #include <utility>
 #include <vector>
 
-#include "cli/write/file_names.h"
 #include "cli/write/json.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"

@@ -3,7 +3,6 @@
 #include <cmath>
 #include <nlohmann/json.hpp>
 
-#include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
 constexpr const char *kStatusWords[] = {"ok", "failed", "stopped"};  // indexed by outcome

@@ -1,12 +1,12 @@
 #include "cli/write/markers.h"
 
 #include <algorithm>
+#include <cinttypes>
 #include <cmath>
 #include <filesystem>
 #include <iterator>
 #include <nlohmann/json.hpp>
 
-#include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
 // A video frame rate and its timecode format.
@@ -103,8 +103,8 @@ std::string clock(double ms) {
 std::string audacity_labels(const record &result, const frame_rate & /*rate*/) {
     std::string out;
     for (const mark &entry : marks_of(result)) {
-        out += formatted("%.6f\t%.6f\t", entry.start_ms / 1000.0, entry.end_ms / 1000.0) +
-               entry.name + "\n";
+        out += formatted("%.6f\t%.6f\t%s\n", entry.start_ms / 1000.0, entry.end_ms / 1000.0,
+                         entry.name.c_str());
     }
     return out;
 }
@@ -125,33 +125,28 @@ std::string reaper_markers(const record &result, const frame_rate & /*rate*/) {
     size_t points = 0;
     for (const mark &entry : marks_of(result)) {
         const bool region = is_region(entry);
-        out += (region ? "R" + std::to_string(++regions) : "M" + std::to_string(++points)) + "," +
-               entry.name + "," + clock(entry.start_ms) + ",";
-        if (region) out += clock(entry.end_ms) + "," + clock(entry.end_ms - entry.start_ms) + "\n";
-        if (!region) out += ",\n";
+        const std::string number =
+            region ? "R" + std::to_string(++regions) : "M" + std::to_string(++points);
+        out += number + "," + entry.name + "," + clock(entry.start_ms) + "," +
+               (region ? clock(entry.end_ms) + "," + clock(entry.end_ms - entry.start_ms) : ",") +
+               "\n";
     }
     return out;
 }
 
 // Returns an FFmpeg metadata file. Its chapters are contiguous and begin at the start of the song.
 std::string ffmetadata_chapters(const record &result, const frame_rate & /*rate*/) {
-    std::vector<mark> chapters;
+    std::vector<std::pair<long long, std::string>> starts = {{0, "start"}};
     for (const mark &entry : marks_of(result)) {
-        chapters.push_back(entry);
-        if (!result.has_beats) chapters.push_back({entry.end_ms, entry.end_ms, "after"});
+        starts.emplace_back(std::llround(entry.start_ms), entry.name);
+        if (!result.has_beats) starts.emplace_back(std::llround(entry.end_ms), "after");
     }
-    if (chapters.empty() || std::llround(chapters[0].start_ms) > 0) {
-        chapters.insert(chapters.begin(), {0.0, 0.0, "start"});
-    }
+    starts.emplace_back(std::llround(song_end_ms(result)), "end");
     std::string out = ";FFMETADATA1\n";
-    for (size_t i = 0; i < chapters.size(); ++i) {
-        const bool is_last = i + 1 == chapters.size();
-        const long long start = std::llround(chapters[i].start_ms);
-        const long long end =
-            std::llround(is_last ? song_end_ms(result) : chapters[i + 1].start_ms);
-        if (end <= start) continue;
-        out += "[CHAPTER]\nTIMEBASE=1/1000\nSTART=" + std::to_string(start) +
-               "\nEND=" + std::to_string(end) + "\ntitle=" + chapters[i].name + "\n";
+    for (size_t i = 0; i + 1 < starts.size(); ++i) {
+        if (starts[i + 1].first <= starts[i].first) continue;
+        out += formatted("[CHAPTER]\nTIMEBASE=1/1000\nSTART=%lld\nEND=%lld\ntitle=%s\n",
+                         starts[i].first, starts[i + 1].first, starts[i].second.c_str());
     }
     return out;
 }
@@ -164,48 +159,44 @@ std::string edl_markers(const record &result, const frame_rate &rate) {
     for (const mark &entry : marks_of(result)) {
         const int64_t start = frame_at(entry.start_ms, rate);
         const std::string times = timecode(start, rate) + " " + timecode(start + 1, rate);
-        out += formatted("\n%03zu  001      V     C        ", ++event) + times + " " + times +
-               "\n |C:ResolveColor" + (is_region(entry) ? "Red" : "Blue") + " |M:" + entry.name +
-               " |D:" + std::to_string(frame_count(entry, rate)) + "\n";
+        out += formatted(
+            "\n%03zu  001      V     C        %s %s\n |C:ResolveColor%s |M:%s |D:%" PRId64 "\n",
+            ++event, times.c_str(), times.c_str(), is_region(entry) ? "Red" : "Blue",
+            entry.name.c_str(), frame_count(entry, rate));
     }
     return out;
 }
 
-// ---- Final Cut Pro XML, version 1.8.
-
-// Returns an XML attribute. The value must already be escaped.
-std::string attribute(const char *name, const std::string &value) {
-    return std::string(" ") + name + "=\"" + value + "\"";
-}
-
 // Formats a number of video frames as a fraction of seconds.
 std::string frames_text(int64_t frames, const frame_rate &rate) {
-    return std::to_string(frames * rate.seconds) + "/" + std::to_string(rate.frames) + "s";
+    return formatted("%" PRId64 "/%ds", frames * rate.seconds, rate.frames);
 }
 
-// Returns a project with the song as its only clip and the markers on the clip.
+// Returns a Final Cut Pro project with the song as its only clip and the markers on the clip.
 std::string fcpxml_markers(const record &result, const frame_rate &rate) {
-    const std::string name = attribute("name", xml_text(base_name(result.file)));
+    const std::string name = xml_text(base_name(result.file));
     const int64_t frames = frame_at(static_cast<double>(result.duration_ms), rate);
-    const std::string length =
-        attribute("duration", frames_text(std::max<int64_t>(1, frames), rate));
-    std::string out =
-        "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<!DOCTYPE fcpxml>\n<fcpxml version=\"1.8\">\n"
-        "<resources>\n";
-    out += "<format id=\"r1\"" + attribute("frameDuration", frames_text(1, rate)) +
-           " width=\"1920\" height=\"1080\"/>\n";
-    out += "<asset id=\"r2\"" + name + attribute("src", file_url(result.file)) + " start=\"0s\"" +
-           length + " hasAudio=\"1\" audioSources=\"1\"" +
-           attribute("audioChannels", std::to_string(result.channels)) +
-           attribute("audioRate", std::to_string(result.sample_rate)) + "/>\n";
-    out += "</resources>\n<project" + name + ">\n<sequence format=\"r1\"" + length +
-           " tcStart=\"0s\"" + attribute("tcFormat", rate.drop ? "DF" : "NDF") + ">\n<spine>\n";
-    out += "<asset-clip ref=\"r2\"" + name + " offset=\"0s\"" + length + ">\n";
+    const std::string length = frames_text(std::max<int64_t>(1, frames), rate);
+    std::string out = formatted(
+        R"(<?xml version="1.0" encoding="UTF-8"?>
+<!DOCTYPE fcpxml>
+<fcpxml version="1.8">
+<resources>
+<format id="r1" frameDuration="%s" width="1920" height="1080"/>
+<asset id="r2" name="%s" src="%s" start="0s" duration="%s" hasAudio="1" audioSources="1" audioChannels="%d" audioRate="%d"/>
+</resources>
+<project name="%s">
+<sequence format="r1" duration="%s" tcStart="0s" tcFormat="%s">
+<spine>
+<asset-clip ref="r2" name="%s" offset="0s" duration="%s">
+)",
+        frames_text(1, rate).c_str(), name.c_str(), file_url(result.file).c_str(), length.c_str(),
+        result.channels, result.sample_rate, name.c_str(), length.c_str(), rate.drop ? "DF" : "NDF",
+        name.c_str(), length.c_str());
     for (const mark &entry : marks_of(result)) {
-        const int64_t start = frame_at(entry.start_ms, rate);
-        out += "<marker" + attribute("start", frames_text(start, rate)) +
-               attribute("duration", frames_text(frame_count(entry, rate), rate)) +
-               attribute("value", entry.name) + "/>\n";
+        out += formatted("<marker start=\"%s\" duration=\"%s\" value=\"%s\"/>\n",
+                         frames_text(frame_at(entry.start_ms, rate), rate).c_str(),
+                         frames_text(frame_count(entry, rate), rate).c_str(), entry.name.c_str());
     }
     return out + "</asset-clip>\n</spine>\n</sequence>\n</project>\n</fcpxml>\n";
 }
@@ -215,13 +206,11 @@ std::string fcpxml_markers(const record &result, const frame_rate &rate) {
 // Returns a LosslessCut project. Its segments are the highlight, then the spans from each beat to
 // the next one or to the end of the song.
 std::string losslesscut_project(const record &result, const frame_rate & /*rate*/) {
-    const std::vector<mark> marks = marks_of(result);
+    std::vector<mark> marks = marks_of(result);
+    marks.push_back({song_end_ms(result), song_end_ms(result), "end"});
     json segments = json::array();
-    for (size_t i = 0; i < marks.size(); ++i) {
-        double end_ms = marks[i].end_ms;
-        if (!is_region(marks[i])) {
-            end_ms = i + 1 < marks.size() ? marks[i + 1].start_ms : song_end_ms(result);
-        }
+    for (size_t i = 0; i + 1 < marks.size(); ++i) {
+        const double end_ms = is_region(marks[i]) ? marks[i].end_ms : marks[i + 1].start_ms;
         if (end_ms <= marks[i].start_ms) continue;  // two beats at the same time
         segments.push_back({{"start", std::round(marks[i].start_ms) / 1000.0},
                             {"end", std::round(end_ms) / 1000.0},

@@ -10,7 +10,6 @@
 #include <filesystem>
 
 #include "cli/system.h"
-#include "cli/write/file_names.h"
 #include "cli/write/value_text.h"
 
 namespace {
