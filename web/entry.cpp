@@ -59,8 +59,7 @@ void analyse_song(record &result, int32_t max_beats) {
 }  // namespace
 
 // Analyses the WAV file at `path`. `channels` is the channel count of the song before the downmix.
-// Returns JSON with "song", which song.js shows, and "result", which has the form of --format json.
-// If the analysis fails, there is only "result".
+// Returns the JSON that song.js shows. If the analysis fails, it has an "error".
 extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, int32_t max_beats,
                              int32_t channels) {
     fnamedec = "";
@@ -69,18 +68,15 @@ extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, i
     result.length_s = length_s;
     analyse_song(result, max_beats);
     result.channels = channels;
-    result_json out;
+    result_json view = json_object(result);
     if (result.status == outcome::ok) {
-        if (const failure failed = read_song_view(result, -1, out["song"])) {
-            result = {path, mode, outcome::failed, failed.sentence};
-            out.erase("song");
-        }
+        const failure failed = read_song_view(result, -1, view);
+        if (failed) view["error"] = failed.sentence;
     }
-    out["result"] = json_object(result);
-    return strdup(out.dump().c_str());
+    return strdup(view.dump().c_str());
 }
 
-// Returns a marker file's content for a "result" of web_analyse, or null for an unknown format.
+// Returns a marker file's content for a result of web_analyse, or null for an unknown format.
 extern "C" char *web_markers(const char *result, int32_t length_s, const char *format,
                              const char *fps) {
     record song = record_from_json(result);

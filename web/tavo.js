@@ -61,9 +61,8 @@ async function analyse(entry) {
   const reply = await work({ wav, name: file.name, mode, length, maxBeats, channels }, [wav]);
   if (reply === null) return fail(entry, "Stopped.");
   if (reply.error) return fail(entry, reply.error);
-  const { song, result } = JSON.parse(reply);
-  if (!song) return fail(entry, result.error);
-  Object.assign(entry, { song: { ...song, name: file.name }, result: { ...result, file: file.name } });
+  const song = entry.song = { ...JSON.parse(reply), file: file.name };
+  if (song.error) return fail(entry, song.error);
   const about = song.hl_refined === false ? "about " : "";
   fill(entry, ["", clock(song.duration_ms), song.bpm === undefined ? "" : `${song.bpm} BPM`,
     song.hl_pos_ms === undefined ? "" : about + clock(song.hl_pos_ms), song.beats_ms ? String(song.beats_ms.length) : ""]);
@@ -123,7 +122,7 @@ function show(entry) {
 
 async function saveMarkers() {
   const [format, suffix] = byId("format").value.split(" ");
-  const text = await work({ result: shown.result, length: shown.length, format, fps: byId("fps").value });
+  const text = await work({ result: shown.song, length: shown.length, format, fps: byId("fps").value });
   if (typeof text !== "string") return;
   const name = shown.file.name;
   download((format === "llc" ? name.replace(/\.[^.]*$/, "") : name) + suffix, "text/plain", text);

@@ -1,9 +1,9 @@
 // The index of songs: sorts them by a column and filters them by name. A line of the data is a song;
-// one that failed has only a name and an error.
-const songs = JSON.parse(`[${byId("data").textContent.trim().replaceAll("\n", ",")}]`);
+// one that failed has only a file and an error.
+const songs = JSON.parse(`[${byId("data").textContent.trim().replaceAll("\n", ",")}]`).map(toPlayerTime);
 const body = document.querySelector("#songs tbody");
 const heads = [...document.querySelectorAll("#songs thead th")];
-const keys = ["name", "duration_ms", "bpm", "hl_pos_ms", "beats"];  // values of the columns
+const keys = ["file", "duration_ms", "bpm", "hl_pos_ms", "beat_count"];  // values of the columns
 
 function miniature(loudness) {
   const picture = shape("svg", { viewBox: "0 0 140 28", role: "img", "aria-label": "Loudness" }, null);
@@ -22,15 +22,15 @@ for (const song of songs) {
     return cell;
   };
   if (song.error) {
-    add("name", song.name);
+    add("name", song.file);
     add("", song.error).colSpan = 5;
     continue;
   }
-  add("name", Object.assign(element("a", song.name), { href: song.page }));
+  add("name", Object.assign(element("a", song.file), { href: song.page }));
   add("number", clock(song.duration_ms));
   add("number", song.bpm ?? "");
   add("number", song.hl_pos_ms === undefined ? "" : clock(song.hl_pos_ms));
-  add("number", song.beats ?? "");
+  add("number", song.beat_count ?? "");
   add("", miniature(song.loudness));
 }
 
@@ -50,8 +50,8 @@ function sortBy(column) {
 function search(words) {
   const sought = words.toLowerCase().split(/\s+/);
   let shown = 0;
-  for (const { name, row } of songs) {
-    row.hidden = !sought.every((word) => name.toLowerCase().includes(word));
+  for (const { file, row } of songs) {
+    row.hidden = !sought.every((word) => file.toLowerCase().includes(word));
     shown += row.hidden ? 0 : 1;
   }
   byId("status").textContent = `${shown} of ${songs.length} songs`;

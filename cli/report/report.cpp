@@ -65,10 +65,10 @@ std::string script_json(const result_json &value) {
 // to the index.
 std::string index_row(const result_json &view, const std::string &page) {
     result_json row = {{"page", percent_encoded(page)}};
-    for (const char *key : {"name", "duration_ms", "bpm", "hl_pos_ms", "loudness"}) {
+    for (const char *key :
+         {"file", "duration_ms", "offset_ms", "bpm", "hl_pos_ms", "beat_count", "loudness"}) {
         if (view.contains(key)) row[key] = view[key];
     }
-    if (view.contains("beats_ms")) row["beats"] = view["beats_ms"].size();
     return script_json(row) + "\n";
 }
 
@@ -104,7 +104,7 @@ failure write_report_page(const record &result, const options &opts, const std::
 }
 
 std::string failed_report_row(const record &result) {
-    const result_json row = {{"name", as_utf8(base_name(result.file))},
+    const result_json row = {{"file", as_utf8(base_name(result.file))},
                              {"error", as_utf8(result.error)}};
     return script_json(row) + "\n";
 }

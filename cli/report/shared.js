@@ -15,6 +15,15 @@ function element(name, ...content) {
   return made;
 }
 
+// Converts a song's times to those of a player, which drops the encoder delay.
+function toPlayerTime(song) {
+  const convert = (ms) => Math.max(ms - song.offset_ms, 0);
+  for (const key of ["hl_pos_ms", "hl_end_ms", "region_end_ms", "beats_ms", "searched_ms"]) {
+    if (key in song) song[key] = Array.isArray(song[key]) ? song[key].map(convert) : convert(song[key]);
+  }
+  return song;
+}
+
 // Returns a new SVG element, appended to the parent unless that is null.
 function shape(name, attributes, parent) {
   const made = document.createElementNS("http://www.w3.org/2000/svg", name);

@@ -1,12 +1,13 @@
 // Draws a song's result on a time axis, in player time (ms), and plays the song.
-const song = JSON.parse(byId("data").textContent);
+const song = toPlayerTime(JSON.parse(byId("data").textContent));
 const beats = song.beats_ms || [];
-song.length_ms = Math.max(song.sound_ms + song.read_ms, song.hl_pos_ms || 0, ...beats.slice(-1));
+const soundStart = -song.offset_ms;
+const songEnd = Math.max(soundStart + song.read_ms, song.hl_pos_ms || 0, ...beats.slice(-1));
 const hasHighlight = song.hl_pos_ms !== undefined;
-const loopEnd = hasHighlight ? Math.min(song.region_end_ms, song.length_ms) : 0;
+const loopEnd = hasHighlight ? Math.min(song.region_end_ms, songEnd) : 0;
 const timeline = byId("timeline");
 const svg = timeline.querySelector("svg");
-const view = { from: 0, to: song.length_ms };
+const view = { from: 0, to: songEnd };
 
 function line(kind, x, top, bottom) {
   return shape("line", { class: kind, x1: x, x2: x, y1: top, y2: bottom }, svg);
@@ -17,7 +18,7 @@ function line(kind, x, top, bottom) {
 function drawWave() {
   const count = song.wave.length / 2;
   const step = song.read_ms / count;
-  const x = (k) => (song.sound_ms + (k + .5) * step).toFixed(1);
+  const x = (k) => (soundStart + (k + .5) * step).toFixed(1);
   const y = (value) => (24 - value * 22 / 127).toFixed(2);
   let path = "";
   for (let k = 0; k < count; ++k) path += `${k ? "L" : "M"}${x(k)} ${y(song.wave[2 * k + 1])}`;
@@ -31,10 +32,10 @@ function drawLoudness() {
   const top = Math.max(...song.loudness, 1e-9);
   const y = (value) => (79 - value / top * 29).toFixed(2);
   // Each value is drawn in the middle of its 6-second window.
-  const points = song.loudness.map((value, k) => `${song.sound_ms + 2000 * k + 3000} ${y(value)}`);
+  const points = song.loudness.map((value, k) => `${soundStart + 2000 * k + 3000} ${y(value)}`);
   shape("path", { class: "loud", d: "M" + points.join("L") }, svg);
   const mean = y(song.loudness.reduce((sum, value) => sum + value) / song.loudness.length);
-  shape("line", { class: "mean", x1: 0, x2: song.length_ms, y1: mean, y2: mean }, svg);
+  shape("line", { class: "mean", x1: 0, x2: songEnd, y1: mean, y2: mean }, svg);
 }
 
 function box(kind, from, to) {
@@ -44,7 +45,7 @@ function box(kind, from, to) {
 
 if (song.searched_ms) {
   box("unsearched", 0, song.searched_ms[0]);
-  box("unsearched", song.searched_ms[1], song.length_ms);
+  box("unsearched", song.searched_ms[1], songEnd);
 }
 byId("unsearched").hidden = !song.searched_ms;
 if (hasHighlight) box("region", song.hl_pos_ms, loopEnd);
@@ -83,9 +84,9 @@ function pictureSvg() {
   const text = (words, left, base, anchor) => {
     shape("text", { x: left, y: base, "text-anchor": anchor }, root).textContent = words;
   };
-  shape("title", {}, root).textContent = song.name;
+  shape("title", {}, root).textContent = song.file;
   shape("rect", { width, height, fill: ink.backgroundColor }, root);
-  text(song.name, 8, 22, "start");
+  text(song.file, 8, 22, "start");
   for (const part of svg.children) {
     const style = getComputedStyle(part);
     const look = { class: part.getAttribute("class"), fill: style.fill, stroke: style.stroke, opacity: style.opacity,
@@ -106,8 +107,8 @@ function pictureSvg() {
 }
 
 function show(from, to) {
-  const span = Math.min(Math.max(to - from, 200), song.length_ms);
-  view.from = Math.min(Math.max(from, 0), song.length_ms - span);
+  const span = Math.min(Math.max(to - from, 200), songEnd);
+  view.from = Math.min(Math.max(from, 0), songEnd - span);
   view.to = view.from + span;
   svg.setAttribute("viewBox", `${view.from} 0 ${span} 100`);
   drawTicks();
@@ -176,7 +177,7 @@ const embedded = {
   },
   now() {
     const seconds = this.node ? this.offset + context.currentTime - this.started : this.offset;
-    return Math.min(1000 * seconds, this.buffer ? 1000 * this.buffer.duration : song.length_ms);
+    return Math.min(1000 * seconds, this.buffer ? 1000 * this.buffer.duration : songEnd);
   },
   playing() { return this.node !== null && this.now() < 1000 * this.buffer.duration; },
 };
@@ -220,7 +221,7 @@ async function togglePlay() {
   } else {
     try {
       await wake();
-      if (player.now() >= song.length_ms - 50) player.seek(0);
+      if (player.now() >= songEnd - 50) player.seek(0);
       dropClicks();
       await player.play();
     } catch (error) {
@@ -231,7 +232,7 @@ async function togglePlay() {
 }
 
 function seek(ms) {
-  player.seek(Math.min(Math.max(ms, 0), song.length_ms));
+  player.seek(Math.min(Math.max(ms, 0), songEnd));
   dropClicks();
   update();
 }
@@ -245,7 +246,7 @@ function update() {
   if (player.playing() && pressed("clicks")) addClicks(now);
   playhead.setAttribute("x1", now);
   playhead.setAttribute("x2", now);
-  byId("clock").textContent = `${clock(now)} of ${clock(song.length_ms)}`;
+  byId("clock").textContent = `${clock(now)} of ${clock(songEnd)}`;
   byId("play").textContent = player.playing() ? "Pause" : "Play";
   press("play", player.playing());
   if (Math.floor(now / 1000) !== spoken) {
@@ -288,10 +289,10 @@ const actions = {
   next: () => stepBeat(1),
   in: () => zoom(.5),
   out: () => zoom(2),
-  whole: () => show(0, song.length_ms),
+  whole: () => show(0, songEnd),
   tobeat: zoomToBeat,
   follow: () => toggle("follow"),
-  picture: () => download(song.name + ".svg", "image/svg+xml", pictureSvg()),
+  picture: () => download(song.file + ".svg", "image/svg+xml", pictureSvg()),
 };
 const keys = { " ": "play", k: "play", h: "gohl", l: "loop", c: "clicks", ",": "prev", ".": "next", "+": "in", "-": "out", 0: "whole", z: "tobeat", f: "follow" };
 for (const id in actions) byId(id).addEventListener("click", actions[id]);
@@ -303,7 +304,7 @@ document.addEventListener("keydown", (event) => {
   const action = keys[event.key.toLowerCase()];
   if (event.key in moves && (event.target === timeline || event.key.startsWith("Arrow"))) seek(player.now() + moves[event.key]);
   else if (event.target === timeline && event.key === "Home") seek(0);
-  else if (event.target === timeline && event.key === "End") seek(song.length_ms);
+  else if (event.target === timeline && event.key === "End") seek(songEnd);
   else if (action && !byId(action).disabled) actions[action]();
   else return;
   event.preventDefault();
@@ -345,8 +346,8 @@ function fact(words, value, isCopied = false) {
   byId("facts").append(item);
 }
 
-document.title = byId("name").textContent = song.name;
-timeline.setAttribute("aria-valuemax", Math.floor(song.length_ms / 1000));
+document.title = byId("name").textContent = song.file;
+timeline.setAttribute("aria-valuemax", Math.floor(songEnd / 1000));
 fact("length", clock(song.duration_ms));
 fact("", `${song.sample_rate} Hz, ${song.channels} ${song.channels === 1 ? "channel" : "channels"}`);
 if (hasHighlight) {
@@ -355,12 +356,12 @@ if (hasHighlight) {
 }
 if (song.bpm !== undefined) {
   fact(song.mode === "both" ? "tempo from the highlight on" : "tempo", `${song.bpm} BPM`);
-  fact("beats", String(beats.length));
+  fact("beats", String(song.beat_count));
 }
 for (const id of ["gohl", "loop"]) byId(id).disabled = !hasHighlight;
 for (const id of ["clicks", "prev", "next", "tobeat"]) byId(id).disabled = beats.length === 0;
 byId("beatlist").hidden = beats.length === 0;
 byId("beattimes").append(...beats.map(timeButton));
 if (song.note) say(song.note);
-show(0, song.length_ms);
+show(0, songEnd);
 update();

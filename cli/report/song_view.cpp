@@ -16,8 +16,6 @@ namespace {
 
 constexpr int32_t kBlockSamples = 4096;
 constexpr size_t kColumns = 4000;  // of the waveform: sharp when zoomed, about 30 KB
-constexpr double kHopMs = int{TAVO_LOUDNESS_HOP_MS};
-constexpr double kWindowMs = int{TAVO_LOUDNESS_WINDOW_MS};
 
 failure read_samples(const std::string &path, int stop_fd, std::vector<int16_t> &samples) {
     const mtsrc_param param{path.c_str()};
@@ -69,31 +67,12 @@ std::vector<float> loudness_of(const std::vector<int16_t> &samples, int32_t rate
 // `count` is the number of loudness values.
 result_json searched_span(const record &result, size_t count) {
     const bool is_short = result.duration_ms / 1000 < TAVO_SHORT_SONG_S;
-    const int skip = is_short ? 0 : TAVO_SEARCH_SKIP;
+    const int start = is_short ? 0 : TAVO_SEARCH_SKIP * TAVO_LOUDNESS_HOP_MS;
     const int tail = is_short ? TAVO_SHORT_SEARCH_TAIL : TAVO_SEARCH_TAIL;
-    const double start = skip * kHopMs;
     // The highlight may start late in the last window searched, so the span includes that window.
-    const double last = static_cast<double>(count) - tail;
-    const double end = last < 0.0 ? start : last * kHopMs + kWindowMs;
-    return {player_ms(result, start), player_ms(result, std::max(start, end))};
-}
-
-void add_result(const record &result, result_json &view) {
-    if (result.has_highlight) {
-        view["hl_pos_ms"] = player_ms(result, result.hl_pos_ms);
-        if (!view["loudness"].empty()) {
-            view["searched_ms"] = searched_span(result, view["loudness"].size());
-        }
-        view["region_end_ms"] = player_ms(result, region_end_ms(result));
-        if (result.length_s > 0) view["hl_end_ms"] = view["region_end_ms"];
-        if (has_refinement(result)) view["hl_refined"] = is_refined(result);
-    }
-    if (!result.has_beats) return;
-    view["bpm"] = result.bpm;
-    view["beats_ms"] = result_json::array();
-    for (const float beat : result.beats_ms) {
-        view["beats_ms"].push_back(player_ms(result, static_cast<double>(beat)));
-    }
+    const int last = static_cast<int>(count) - tail;
+    const int end = last < 0 ? 0 : last * TAVO_LOUDNESS_HOP_MS + TAVO_LOUDNESS_WINDOW_MS;
+    return {start, std::max(start, end)};
 }
 
 }  // namespace
@@ -103,15 +82,15 @@ failure read_song_view(const record &result, int stop_fd, result_json &view) {
     std::vector<int16_t> samples;
     samples.reserve(static_cast<size_t>(result.duration_ms * rate / 1000));
     if (failure failed = read_samples(result.sound_path, stop_fd, samples)) return failed;
-    view = {{"name", as_utf8(base_name(result.file))},
-            {"mode", mode_word(result.mode)},
-            {"sample_rate", rate},
-            {"channels", result.channels},
-            {"duration_ms", result.duration_ms},
-            {"sound_ms", -result.offset_ms},
-            {"read_ms", 1000.0 * static_cast<double>(samples.size()) / rate},
-            {"wave", wave_of(samples)},
-            {"loudness", loudness_of(samples, rate)}};
-    add_result(result, view);
+    const std::vector<float> loudness = loudness_of(samples, rate);
+    record named = result;
+    named.file = base_name(result.file);
+    view = json_object(named);
+    view["read_ms"] = 1000.0 * static_cast<double>(samples.size()) / rate;
+    view["wave"] = wave_of(samples);
+    view["loudness"] = loudness;
+    if (!result.has_highlight) return {};
+    view["region_end_ms"] = region_end_ms(result);
+    if (!loudness.empty()) view["searched_ms"] = searched_span(result, loudness.size());
     return {};
 }

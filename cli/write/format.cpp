@@ -3,8 +3,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
-#include <charconv>
 #include <cmath>
 #include <nlohmann/json.hpp>
 #include <utility>
@@ -77,12 +75,6 @@ std::string quoted(const std::string &text) {
 
 std::string cell(const result_json &value) {
     if (value.is_string()) return quoted(value.get<std::string>());
-    if (value.is_number_float()) {  // the shortest decimal that converts back to the same float
-        std::array<char, 64> text{};
-        const auto end = std::to_chars(text.data(), text.data() + text.size(), value.get<float>(),
-                                       std::chars_format::fixed);
-        return std::string(text.data(), end.ptr);
-    }
     if (!value.is_array()) return value.dump();
     std::string numbers;
     for (const result_json &item : value) numbers += (numbers.empty() ? "" : " ") + cell(item);

@@ -78,11 +78,11 @@ class Report(Browser):
 
         (timeline,) = self.find("#timeline")
         webdriver.ActionChains(self.browser).move_to_element(timeline).click().perform()
-        self.wait("Math.abs(player.now() - song.length_ms / 2) < song.length_ms / 100")
+        self.wait("Math.abs(player.now() - songEnd / 2) < songEnd / 100")
         self.click("tobeat")
         self.assertAlmostEqual(self.script("return view.to - view.from"), 2000, delta=1)
         timeline.send_keys("0")
-        self.assertTrue(self.script("return view.from === 0 && view.to === song.length_ms"))
+        self.assertTrue(self.script("return view.from === 0 && view.to === songEnd"))
         self.find("#beattimes button")[0].click()
         self.wait("Math.abs(player.now() - beats[0]) < 1")
         self.wait("document.getElementById('status').textContent.endsWith('copied.')")
@@ -122,11 +122,12 @@ class Report(Browser):
             self.assertEqual(view("song.wav", "--mode", "highlight")["searched_ms"], searched)
         # The page shows player times: players skip an MP3 file's encoder delay.
         subprocess.run(["lame", "--quiet", standard_song(), self.folder / "song.mp3"], check=True)
-        page = view("song.mp3", "--length", "12")
+        self.run_tavo("--report", "page.html", "--force", "--length", "12", "song.mp3")
+        self.show("page.html")
         (result,) = self.run_json("--length", "12", "song.mp3")
         self.assertGreater(result["offset_ms"], 10)
         shifted = [ms - result["offset_ms"] for ms in (0, result["hl_pos_ms"], result["hl_end_ms"], *result["beats_ms"])]
-        times = [page["sound_ms"], page["hl_pos_ms"], page["hl_end_ms"], *page["beats_ms"]]
+        times = self.script("return [soundStart, song.hl_pos_ms, song.hl_end_ms, ...beats]")
         for ms, expected in zip(times, shifted, strict=True):
             self.assertAlmostEqual(ms, expected, delta=0.01)
 
@@ -153,7 +154,7 @@ class Report(Browser):
                     if embed:
                         path.unlink()
                     self.show("page.html")
-                    self.assertEqual(self.script("return song.name"), name.decode("utf-8", "replace"))
+                    self.assertEqual(self.script("return song.file"), name.decode("utf-8", "replace"))
                     self.assertEqual(self.find("#name")[0].text, name.decode("utf-8", "replace"))
                     note = self.find("#status")[0].text
                     self.assertEqual("--embed" in note, name == b"bare.aac" and not embed, note)

@@ -57,7 +57,7 @@ class Page(Browser):
             wav = self.put("mono/" + name, base64.b64decode(self.script(AS_BASE64, name)))
             (native,) = self.run_json("--length", "30", wav)
             self.browser.find_element(By.XPATH, f"//button[text()='{name}']").click()
-            self.assertEqual(found(self.script("return shown.result")), found(native), name)
+            self.assertEqual(found(self.script("return shown.song")), found(native), name)
             for word, suffix in FORMATS.items():
                 stem = "song" if word == "llc" else name
                 self.run_tavo("-f", word, "-l", "30", "--force", wav)
