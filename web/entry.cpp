@@ -5,7 +5,7 @@
 #include <string>
 
 #include "cli/report/song_view.h"
-#include "cli/write/json.h"
+#include "cli/write/format.h"
 #include "cli/write/markers.h"
 #include "include/tavo.h"
 

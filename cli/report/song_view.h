@@ -7,7 +7,7 @@
 
 #include "cli/failure.h"
 #include "cli/run/record.h"
-#include "cli/write/json.h"
+#include "cli/write/format.h"
 
 // Reads the sound once, up to its end or a read error. Fails if stop_fd becomes readable, which
 // requests a stop.

@@ -16,7 +16,6 @@
 #include "cli/system.h"
 #include "cli/write/clip.h"
 #include "cli/write/format.h"
-#include "cli/write/json.h"
 #include "cli/write/markers.h"
 #include "cli/write/output_file.h"
 #include "cli/write/value_text.h"

@@ -33,9 +33,6 @@ struct database_kind {
     failure (*open)(const std::string &location, bool read_only, connection &out);
 };
 
-// Finds the kind of database for a store's URL, and the location to pass to its open function.
-failure find_database(const std::string &url, const database_kind **kind, std::string &location);
-
 // In sqlite.cpp; has a null address if the program was built without SQLite.
 extern const database_kind sqlite_database __attribute__((weak));
 

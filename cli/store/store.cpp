@@ -1,10 +1,12 @@
 #include "cli/store/store.h"
 
+#include <dlfcn.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <array>
+#include <filesystem>
 #include <functional>
 #include <iterator>
 #include <nlohmann/json.hpp>
@@ -152,6 +154,32 @@ stored_song song_of(const row &cells, int32_t mode) {
 
 // ---- The connection.
 
+// Returns null if the program was built without PostgreSQL. PostgreSQL's client library depends on
+// two dozen others, so the module that needs it is loaded on demand.
+const database_kind *postgresql_database() {
+    void *module = dlopen("libtavo_postgresql.so", RTLD_NOW | RTLD_LOCAL);
+    if (module == nullptr) return nullptr;
+    return static_cast<const database_kind *>(dlsym(module, "tavo_postgresql_database"));
+}
+
+// Finds the kind of database for the store's URL.
+failure find_database(store &db) {
+    const std::string &url = db.opts.store;
+    db.location = url;
+    if (url.rfind("postgresql://", 0) == 0 || url.rfind("postgres://", 0) == 0) {
+        db.kind = postgresql_database();
+        return {db.kind == nullptr ? "This tavo was built without PostgreSQL." : ""};
+    }
+    if (url.rfind("sqlite:", 0) == 0) {
+        db.location = url.substr(7);
+    } else if (std::filesystem::path(url).extension() != ".db") {
+        return {
+            "--store takes sqlite:FILE, a file that ends in .db, or postgresql://HOST/DATABASE."};
+    }
+    db.kind = &sqlite_database;
+    return {db.kind == nullptr ? "This tavo was built without SQLite." : ""};
+}
+
 failure connect(store &db) {
     return db.run ? failure() : db.kind->open(db.location, db.opts.from_store, db.run);
 }
@@ -270,7 +298,7 @@ std::string summary_text(const store &db) {
 failure open_store(store &db, const options &opts) {
     if (opts.store.empty()) return {};
     db.opts = opts;
-    if (failure failed = find_database(opts.store, &db.kind, db.location)) return failed;
+    if (failure failed = find_database(db)) return failed;
     const failure failed = open_table(db);
     if (!failed) return {};
     return {"The store cannot be used: " + shown(failed.sentence) + "."};

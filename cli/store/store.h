@@ -1,7 +1,7 @@
 // Results in a database: --store. Several commands may share one store. Without --store these
 // functions do nothing.
 //
-// Input: results as JSON (write/json.h). Output: one row for each song and set of parameters. A
+// Input: results as JSON (write/format.h). Output: one row for each song and set of parameters. A
 // batch of rows is one transaction, so a command that is killed loses at most the open batch and
 // leaves no row half-written. Used by main.cpp, in the command's own process.
 #ifndef TAVO_CLI_STORE_STORE_H
