@@ -275,16 +275,14 @@ failure check_output(const CLI::App &app, const options &out) {
     std::string sample;
     const failure bad_template = fill_template(out.print, {}, sample);
     return first_of({
-        {!out.output_dir.empty() && !has_files,
-         "--output-dir needs a format that writes files, such as --format labels."},
+        {!has_files && (!out.output_dir.empty() || out.skip_existing),
+         "--output-dir and --skip-existing need a format that writes files, such as --format "
+         "labels."},
         {app.count("--fps") > 0 && !has_frames,
          "--fps is only for --format edl, fcpxml and otio, which count frames."},
         {!out.print.empty() && app.count("--format") > 0,
-         "--print replaces --format; give only "
-         "one of them."},
+         "--print replaces --format; give only one of them."},
         {!bad_template.sentence.empty(), bad_template.sentence},
-        {out.skip_existing && !has_files,
-         "--skip-existing needs a format that writes files, such as --format labels."},
         {out.skip_existing && out.force, "--skip-existing and --force exclude each other."},
         {!out.output_dir.empty() && !is_folder(out.output_dir),
          out.output_dir + ": is not a folder."},
