@@ -86,13 +86,9 @@ class Report(Browser):
         self.find("#beattimes button")[0].click()
         self.wait("Math.abs(player.now() - beats[0]) < 1")
         self.wait("document.getElementById('status').textContent.endsWith('copied.')")
-        self.assertEqual(self.browser.get_log("browser"), [])
 
-    def test_the_picture_is_saved_as_seen(self):
-        self.put("song.wav", source=standard_song())
-        (result,) = self.run_json("--length", "12", "--report", "page.html", "song.wav")
-        self.show("page.html")
-        self.click("tobeat", "out", "out", "out")  # shows part of the song
+        # The saved picture shows the same part of the song.
+        self.click("tobeat", "out", "out", "out")
         start, end = self.script("return [view.from, view.to]")
         root = ElementTree.fromstring(self.script("return pictureSvg()"))
         lines = [e for e in root.iter() if e.get("class") in ("beat", "start")]
@@ -101,6 +97,7 @@ class Report(Browser):
             self.assertAlmostEqual(shown, ms, delta=2)
         self.assertEqual({e.get("stroke") for e in lines}, {"rgb(27, 27, 27)", "rgb(194, 78, 0)"})
         self.assertIn("song.wav", [e.text for e in root])
+        self.assertEqual(self.browser.get_log("browser"), [])
 
     def test_waveform_and_loudness(self):
         def view(name, *arguments):
@@ -154,7 +151,6 @@ class Report(Browser):
                     if embed:
                         path.unlink()
                     self.show("page.html")
-                    self.assertEqual(self.script("return song.file"), name.decode("utf-8", "replace"))
                     self.assertEqual(self.find("#name")[0].text, name.decode("utf-8", "replace"))
                     note = self.find("#status")[0].text
                     self.assertEqual("--embed" in note, name == b"bare.aac" and not embed, note)
