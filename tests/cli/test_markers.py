@@ -149,9 +149,8 @@ class Markers(Case):
     def test_fcpxml(self):
         for fps in ("29.97df", "25"):
             path, marks = self.write("fcpxml", "--length 12", "--fps " + fps)
-            text = path.read_text()
-            self.assertTrue(text.startswith('<?xml version="1.0" encoding="UTF-8"?>\n<!DOCTYPE fcpxml>'))
-            root = ElementTree.fromstring(text)
+            self.assertTrue(path.read_text().startswith('<?xml version="1.0" encoding="UTF-8"?>\n<!DOCTYPE fcpxml>'))
+            root = ElementTree.parse(path).getroot()
             self.assertEqual(set(root.iter()), {element for path in FCPXML for element in root.findall(path)})
             for path, attributes in FCPXML.items():
                 self.assertTrue(all(e.attrib.keys() >= set(attributes.split()) for e in root.findall(path)), path)

@@ -19,8 +19,7 @@ class Outputs(Case):
         before = self.song.read_bytes()
         self.run_tavo("song.wav")
         self.assert_only("song.wav")
-        mask = os.umask(0o027)
-        self.addCleanup(os.umask, mask)
+        self.addCleanup(os.umask, os.umask(0o027))
         self.run_tavo("--report", "[p,q].html", "--click", "c.wav", *LABELS, "song.wav",
                       printed=b"song.wav.labels.txt\n")
         written = ("song.wav.labels.txt", "c.wav", "[p,q].html")

