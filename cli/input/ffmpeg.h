@@ -1,7 +1,7 @@
 // Runs the ffmpeg program on one untrusted file.
 //
 // Input: a file, and the arguments that describe the output. Output: what the program writes to
-// standard output. Used by song_file.h and write/clip.h in a worker process.
+// standard output. Used by song_file.h and write/sound_files.h in a worker process.
 #ifndef TAVO_CLI_INPUT_FFMPEG_H
 #define TAVO_CLI_INPUT_FFMPEG_H
 

@@ -17,8 +17,8 @@
 #include "cli/input/recognise.h"
 #include "cli/input/song_file.h"
 #include "cli/system.h"
-#include "cli/write/clip.h"
 #include "cli/write/markers.h"
+#include "cli/write/sound_files.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
 

@@ -10,7 +10,7 @@
 #include "cli/input/player_offset.h"
 #include "cli/input/recognise.h"
 #include "cli/system.h"
-#include "cli/write/click.h"
+#include "cli/write/sound_files.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
 

@@ -14,10 +14,10 @@
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
 #include "cli/system.h"
-#include "cli/write/clip.h"
 #include "cli/write/format.h"
 #include "cli/write/markers.h"
 #include "cli/write/output_file.h"
+#include "cli/write/sound_files.h"
 #include "cli/write/value_text.h"
 
 NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(input, index, path, stored)

@@ -1,4 +1,4 @@
-#include "cli/write/clip.h"
+#include "cli/write/sound_files.h"
 
 #include <strings.h>
 
@@ -6,9 +6,10 @@
 #include <filesystem>
 
 #include "cli/input/ffmpeg.h"
+#include "cli/input/recognise.h"
 #include "cli/system.h"
-#include "cli/write/output_file.h"
 #include "cli/write/value_text.h"
+#include "include/tavo.h"
 
 namespace {
 
@@ -56,7 +57,38 @@ std::string cut_filter(const record &result, const options &opts) {
     return filter;
 }
 
+// The library ignores write errors, so only the length shows that the disk was full.
+bool is_whole_track(const std::string &path) {
+    int code = 0;
+    const std::string size = read_bytes(path, 40, 4, code);  // of the samples, little-endian
+    std::error_code failed;
+    return fs::file_size(path, failed) ==
+           44 + big_endian(std::string(size.rbegin(), size.rend()), 0, 4);
+}
+
 }  // namespace
+
+failure begin_click(output_file &track, const options &opts, const std::string &input) {
+    fnamedec = "";
+    if (opts.click.empty()) return {};
+    if (same_file(opts.click, input)) {
+        return {"The click track would replace the file that is analysed."};
+    }
+    failure failed = check_target(opts.click, opts.force);
+    if (!failed) failed = begin_output(track, opts.click);
+    if (!failed) fnamedec = track.temporary.c_str();
+    return failed;
+}
+
+failure finish_click(output_file &track, const options &opts, bool is_analysed) {
+    fnamedec = "";
+    if (track.temporary.empty()) return {};
+    if (is_analysed && is_whole_track(track.temporary)) return commit_output(track, opts.force);
+    abandon_output(track);
+    if (!is_analysed) return {};
+    return {"The click track " + shown(opts.click) +
+            " could not be written whole; the disk may be full."};
+}
 
 std::string clip_path(const std::string &input, const options &opts) {
     std::error_code failed;
