@@ -241,7 +241,6 @@ void declare_all(CLI::App &app, options &out) {
         declare(app, out);
     }
     for (CLI::Option *option : app.get_options()) {
-        option->description(wrapped(option->get_description()));
         if (option->get_items_expected_max() == 0) continue;  // a flag
         const bool is_file = option->get_positional();
         const auto check = [is_file](std::string &value) {
@@ -379,6 +378,9 @@ std::optional<int> parse_options(int argc, char **argv, options &out) {
         if (end.get_name() == "CallForHelp") {
             std::cout << kUsage << kAbout << "\n\n" << kExamples << "\n" << kOptionNames;
         } else {
+            for (CLI::Option *option : app.get_options()) {
+                option->description(wrapped(option->get_description()));
+            }
             app.exit(end);
         }
         if (std::cout.flush()) return kExitOk;
