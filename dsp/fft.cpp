@@ -123,112 +123,27 @@ void run_two_stages(const spectrum<T> &x, size_t half, size_t size, const TAVO_F
     }
 }
 
-// Runs the stages whose butterfly inputs are `half`, 2 * `half`, ... elements apart, up to but not
-// including `end`.
+// Runs a radix-2 transform with decimation in time.
 template <typename T>
-void run_stages(const spectrum<T> &x, size_t half, size_t end, size_t size,
-                const TAVO_FFT_CTX *ctx) {
-    if (count_halvings(end / half) % 2 != 0) {
+void transform(const spectrum<T> &x, int32_t n, const TAVO_FFT_CTX *ctx) {
+    if (!has_tables(ctx, n)) return;
+    permute(x.re, x.im, n, ctx->bit_reverse);
+    const auto size = static_cast<size_t>(n);
+    size_t half = 1;
+    if (ctx->stages % 2 != 0) {
         run_stage(x, half, size, ctx);
         half *= 2;
     }
-    for (; half < end; half *= 4) run_two_stages(x, half, size, ctx);
-}
-
-// Runs a radix-2 transform with decimation in time.
-template <typename T>
-void transform(T *re, T *im, int32_t n, const TAVO_FFT_CTX *ctx) {
-    if (!has_tables(ctx, n)) return;
-    permute(re, im, n, ctx->bit_reverse);
-    const auto size = static_cast<size_t>(n);
-    run_stages<T>({re, im}, 1, size, size, ctx);
-}
-
-// The outputs of a butterfly whose inputs are real.
-struct real_pair {
-    complex<double_pair> sum;
-    complex<double_pair> difference;
-};
-
-inline real_pair real_butterfly(double_pair top, double_pair bottom, complex<double> w) {
-    const complex<double_pair> t = {bottom * w.re, bottom * w.im};
-    return {{top + t.re, t.im}, {top - t.re, -t.im}};
+    for (; half < size; half *= 4) run_two_stages(x, half, size, ctx);
 }
 
 inline double_pair windowed(const frame_pair &frames, size_t i) {
     return double_pair{frames.first[i], frames.second[i]} * frames.window[i];
 }
 
-constexpr size_t kFirstGroup = 8;  // elements that the first three stages combine
-
-// Runs the first three stages on the eight windowed samples at i, i + step, ..., i + 7 * step and
-// stores the results in `x` from index `first` on. Skips multiplications by 1 and by zero imaginary
-// parts; if the results are finite, this changes only the sign of zeros.
-inline void start_group(const frame_pair &frames, size_t i, size_t step, size_t first,
-                        const spectrum<double_pair> &x, const TAVO_FFT_CTX *ctx) {
-    const double_pair zero = {0.0, 0.0};
-    const complex<double> quarter = twiddle(ctx, 2 * step);
-    const double_pair a = windowed(frames, i);
-    const double_pair b = windowed(frames, i + 4 * step);
-    const double_pair c = windowed(frames, i + 2 * step);
-    const double_pair d = windowed(frames, i + 6 * step);
-    const double_pair even = (a + b) + (c + d);
-    const double_pair even_turned = (a + b) - (c + d);
-    real_pair low = real_butterfly(a - b, c - d, quarter);
-    const double_pair e = windowed(frames, i + step);
-    const double_pair f = windowed(frames, i + 5 * step);
-    const double_pair g = windowed(frames, i + 3 * step);
-    const double_pair h = windowed(frames, i + 7 * step);
-    const double_pair odd = (e + f) + (g + h);
-    const double_pair odd_turned = (e + f) - (g + h);
-    real_pair high = real_butterfly(e - f, g - h, quarter);
-
-    store(x, first, {even + odd, zero});
-    store(x, first + 4, {even - odd, zero});
-    const real_pair middle = real_butterfly(even_turned, odd_turned, quarter);
-    store(x, first + 2, middle.sum);
-    store(x, first + 6, middle.difference);
-    butterfly(&low.sum, &high.sum, twiddle(ctx, step));
-    store(x, first + 1, low.sum);
-    store(x, first + 5, high.sum);
-    butterfly(&low.difference, &high.difference, twiddle(ctx, 3 * step));
-    store(x, first + 3, low.difference);
-    store(x, first + 7, high.difference);
-}
-
-// Returns the number that follows `x` when the numbers below `limit` are counted in bit-reversed
-// order.
-size_t next_reversed(size_t x, size_t limit) {
-    size_t bit = limit / 2;
-    for (; (x & bit) != 0; bit /= 2) x -= bit;
-    return x + bit;
-}
-
 inline double_pair power_of(const complex<double_pair> &x) {
     const double_pair power = x.re * x.re + x.im * x.im;
     return __builtin_convertvector(__builtin_convertvector(power, float_pair), double_pair);
-}
-
-// Runs the last two stages, but computes only the powers of the bins below size / 2. Returns the
-// sum of these powers.
-double_pair finish_powers(const spectrum<double_pair> &x, size_t size, const TAVO_FFT_CTX *ctx,
-                          double_pair *powers) {
-    const size_t half = size / 4;
-    double_pair sum = {0.0, 0.0};
-    for (size_t j = 0; j < half; ++j) {
-        complex<double_pair> a = load(x, j);
-        complex<double_pair> b = load(x, j + half);
-        complex<double_pair> c = load(x, j + 2 * half);
-        complex<double_pair> d = load(x, j + 3 * half);
-        butterfly(&a, &b, twiddle(ctx, 2 * j));
-        butterfly(&c, &d, twiddle(ctx, 2 * j));
-        butterfly(&a, &c, twiddle(ctx, j));
-        butterfly(&b, &d, twiddle(ctx, j + half));
-        powers[j] = power_of(a);
-        powers[j + half] = power_of(b);
-        sum += powers[j] + powers[j + half];
-    }
-    return sum;
 }
 
 }  // namespace
@@ -251,7 +166,7 @@ void tavo_fft_init(int16_t n, TAVO_FFT_CTX *ctx) {
 }
 
 double *tavo_fft_proc(double *re, double *im, int16_t n, const TAVO_FFT_CTX *ctx) {
-    transform(re, im, n, ctx);
+    transform<double>({re, im}, n, ctx);
     return re;
 }
 
@@ -259,18 +174,8 @@ void compute_frame_powers(const frame_pair &frames, int32_t n, const TAVO_FFT_CT
                           double_pair *scratch, double_pair *powers) {
     const auto size = static_cast<size_t>(n);
     const spectrum<double_pair> x = {scratch, scratch + size};
-    if (has_tables(ctx, n) && size >= 4 * kFirstGroup) {
-        size_t reversed = 0;
-        for (size_t first = 0; first < size; first += kFirstGroup) {
-            start_group(frames, reversed, size / kFirstGroup, first, x, ctx);
-            reversed = next_reversed(reversed, size / kFirstGroup);
-        }
-        run_stages(x, kFirstGroup, size / 4, size, ctx);
-        const double_pair sum = finish_powers(x, size, ctx, powers);
-        if (std::isfinite(sum[0]) && std::isfinite(sum[1])) return;
-    }
     for (size_t i = 0; i < size; ++i) store(x, i, {windowed(frames, i), double_pair{0.0, 0.0}});
-    transform(x.re, x.im, n, ctx);
+    transform(x, n, ctx);
     for (size_t j = 0; j < size / 2; ++j) powers[j] = power_of(load(x, j));
 }
 
