@@ -88,7 +88,7 @@ void wait_and_serve(run_state &state) {
     std::vector<pollfd> watched = {{state.is_ending ? -1 : STDOUT_FILENO, 0, 0},
                                    {is_listening ? state.supply.list.fd : -1, POLLIN, 0}};
     poll_workers(state.pool, watched, may_search(state) && !is_listening ? 0 : kTickMs);
-    if ((watched[0].revents & POLLERR) != 0) state.output.write_error = EPIPE;
+    if ((watched[0].revents & (POLLERR | POLLHUP)) == POLLERR) state.output.write_error = EPIPE;
     report_failure(state.output, commit_old_batch(state.db));
     draw_progress(state.output);
 }

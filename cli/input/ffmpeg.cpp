@@ -104,8 +104,10 @@ failure watch(ffmpeg_process &process, int stop_fd, const output_check &check, i
     auto deadline = clock_type::now() + std::chrono::seconds(kIdleSeconds);
     while (true) {
         pollfd watched[] = {{process.message_fd, POLLIN, 0}, {stop_fd, POLLIN, 0}};
-        poll(watched, std::size(watched), kCheckMs);
+        poll(watched, std::size(watched), process.message_fd < 0 ? 1 : kCheckMs);
         if (watched[1].revents != 0) return {"The analysis was stopped."};
+        siginfo_t end{};
+        if (process.message_fd < 0) waitid(P_PID, process.pid, &end, WEXITED | WNOHANG | WNOWAIT);
         const off_t before = std::exchange(file.st_size, 0);
         fstat(output, &file);
         if (file.st_size > before) {
@@ -116,9 +118,10 @@ failure watch(ffmpeg_process &process, int stop_fd, const output_check &check, i
             return {"ffmpeg made no progress for " + std::to_string(kIdleSeconds) +
                     " s and was ended."};
         }
+        if (end.si_pid != 0) return {};
         if (watched[0].revents == 0) continue;
         const ssize_t got = read(process.message_fd, part.data(), part.size());
-        if (got == 0 || (got < 0 && errno != EINTR)) return {};
+        if (got == 0 || (got < 0 && errno != EINTR)) close_fd(process.message_fd);
         if (got < 0 || process.message.size() >= kMostMessageBytes) continue;
         process.message.append(part.data(), static_cast<size_t>(got));
     }
@@ -152,7 +155,10 @@ std::string find_ffmpeg() {
     std::istringstream folders(variable == nullptr ? "" : variable);
     for (std::string folder; std::getline(folders, folder, ':');) {
         const std::string path = folder + "/ffmpeg";
-        if (path.front() == '/' && access(path.c_str(), X_OK) == 0) return path;
+        if (path.front() == '/' && access(path.c_str(), X_OK) == 0 &&
+            access((path + "/.").c_str(), F_OK) != 0) {  // not a folder
+            return path;
+        }
     }
     return "";
 }

@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <strings.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -41,20 +42,28 @@ void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
 }
 
+file_id id_of(const struct stat &info) {
+    return {info.st_dev, info.st_ino};
+}
+
 // Claims the marker file or clip of an input, so that no other input writes the same file. Returns
 // false if the input must be skipped.
 bool claim_target(input_supply &supply, input &entry, const std::string &target) {
-    std::error_code failed;
-    if (supply.opts.skip_existing && fs::exists(fs::symlink_status(target, failed))) {
+    struct stat file {};
+    struct stat folder {};
+    if (supply.opts.skip_existing && lstat(target.c_str(), &file) == 0) {
         ++supply.existing;
         return false;
     }
-    const std::string source = fs::weakly_canonical(entry.path, failed);
-    const std::string resolved = fs::weakly_canonical(fs::absolute(target, failed), failed);
-    if (failed) return true;  // the failure is reported when the file is written
-    const auto [claim, is_first] = supply.targets.emplace(resolved, source);
+    const std::string name = base_name(target);
+    const std::string folder_path = target.substr(0, target.size() - name.size()) + ".";
+    if (stat(folder_path.c_str(), &folder) != 0 || stat(entry.path.c_str(), &file) != 0) {
+        return true;  // a failure is reported when the file is read or written
+    }
+    const auto [claim, is_first] =
+        supply.targets.emplace(std::pair(id_of(folder), name), id_of(file));
     if (is_first) return true;
-    if (claim->second == source) {
+    if (claim->second == id_of(file)) {
         add_note(supply, shown(entry.path) + ": named more than once, done once.");
         return false;
     }
@@ -72,8 +81,9 @@ bool claim_targets(input_supply &supply, input &entry) {
 
 // Adds the entries of a folder, unless this search has already entered it through another link.
 failure enter_folder(input_supply &supply, const std::string &path) {
+    struct stat info {};
+    if (stat(path.c_str(), &info) == 0 && !supply.searched.insert(id_of(info)).second) return {};
     std::error_code code;
-    if (!supply.searched.insert(fs::weakly_canonical(path, code)).second) return {};
     std::vector<std::string> entries;
     fs::directory_iterator entry(path, code);
     for (; !code && entry != fs::directory_iterator(); entry.increment(code)) {

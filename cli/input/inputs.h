@@ -4,9 +4,12 @@
 #ifndef TAVO_CLI_INPUT_INPUTS_H
 #define TAVO_CLI_INPUT_INPUTS_H
 
+#include <sys/types.h>
+
 #include <map>
 #include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "cli/failure.h"
@@ -32,18 +35,20 @@ struct name_list {
     bool ended = false;     // the end of the list has been read
 };
 
+using file_id = std::pair<dev_t, ino_t>;
+
 struct input_supply {
     const options &opts;
     size_t argument = 0;                    // next index in opts.inputs, then in opts.lists
     name_list list = {};                    // list that is being read
     std::string folder = {};                // folder that is being searched, or empty
     std::vector<std::string> entries = {};  // entries of the folder not yet examined, last first
-    std::set<std::string> searched = {};    // the folder and its searched subfolders, without links
+    std::set<file_id> searched = {};        // the folder and its searched subfolders
     size_t found = 0;                       // audio files found in the folder
     size_t skipped = 0;                     // other files found in the folder
     size_t existing = 0;                    // inputs left out by --skip-existing
-    // The path of each marker file or clip, and that of its input, both without links.
-    std::map<std::string, std::string> targets = {};
+    // The folder and the name of each marker file or clip, and its input.
+    std::map<std::pair<file_id, std::string>, file_id> targets = {};
     std::string notes = {};  // lines for standard error
 };
 

@@ -28,16 +28,22 @@ constexpr signature kSignatures[] = {
     {file_kind::mp4, "", 4, "moov"},
     {file_kind::mp4, "", 4, "mdat"},
     {file_kind::aac, "ADIF"},
+    {file_kind::aiff, "FORM", 8, "AIF"},
+    {file_kind::asf, "\x30\x26\xB2\x75\x8E\x66\xCF\x11"},
+    {file_kind::matroska, "\x1A\x45\xDF\xA3"},
 };
 
-// The format's name and the codings that the library reads in it, in the order of file_kind.
+// The format's name and the codings that the library reads in it, in the order of file_kind. The
+// library reads none of the last three formats.
 struct kind_text {
     const char *name;
     const char *codings;
 };
-constexpr kind_text kKinds[] = {{"audio", "MPEG"}, {"WAV", "16-bit integer PCM"}, {"FLAC", "FLAC"},
-                                {"Ogg", "Vorbis"}, {"MP4", "AAC or MP3"},         {"AAC", "AAC"},
-                                {"MP3", "MPEG"}};
+constexpr kind_text kKinds[] = {{"audio", "MPEG"},     {"WAV", "16-bit integer PCM"},
+                                {"FLAC", "FLAC"},      {"Ogg", "Vorbis"},
+                                {"MP4", "AAC or MP3"}, {"AAC", "AAC"},
+                                {"MP3", "MPEG"},       {"AIFF", ""},
+                                {"Windows Media", ""}, {"Matroska", ""}};
 
 // Recognises an MPEG audio or ADTS frame header. A UTF-16 byte order mark is not one.
 file_kind recognise_frame(std::string_view head) {
@@ -75,6 +81,7 @@ std::string explain_code(file_kind kind, int32_t code, const TAVO_STREAM &stream
             if (kind == file_kind::unknown) {
                 return "The file is not recognised as audio of a known format.";
             }
+            if (text.codings[0] == '\0') return subject + "has a format that only ffmpeg reads.";
             return subject + "is damaged or is not " + text.codings + " audio at " + lowest +
                    " to " + std::to_string(TAVO_MAX_RATE) + " Hz, which is all that is read.";
         case TAVO_ERR_OPEN:
@@ -147,13 +154,14 @@ uint64_t big_endian(std::string_view bytes, size_t offset, size_t size) {
 
 int64_t find_id3v2_end(const std::string &path, int &code) {
     constexpr int64_t kHeaderBytes = 10;
+    constexpr int kMostTags = 100;  // files have one or two
     int64_t end = 0;
-    while (true) {
+    for (int tags = 0; tags < kMostTags; ++tags) {
         const std::string head = read_bytes(path, end, kHeaderBytes, code);
         const uint64_t length = big_endian(head, 6, 4);
         const bool is_tag = head.size() == kHeaderBytes && head.compare(0, 3, "ID3") == 0 &&
                             static_cast<uint8_t>(head[3]) < 0x10 && (length & 0x80808080u) == 0;
-        if (!is_tag) return end;
+        if (!is_tag) break;
         int64_t bytes = 0;  // seven bits per byte
         for (int shift = 24; shift >= 0; shift -= 8) {
             bytes = bytes << 7 | static_cast<int64_t>(length >> shift & 0x7F);
@@ -161,6 +169,7 @@ int64_t find_id3v2_end(const std::string &path, int &code) {
         const bool has_footer = (static_cast<uint8_t>(head[5]) & 0x10) != 0;
         end += kHeaderBytes + bytes + (has_footer ? kHeaderBytes : 0);
     }
+    return end;
 }
 
 std::string explain_refusal(const std::string &path, int32_t code, const TAVO_STREAM &stream) {

@@ -13,7 +13,7 @@
 #include "include/tavo.h"
 
 // mpeg is MPEG audio, Layers I to III; messages call it MP3.
-enum class file_kind { unknown, wav, flac, ogg, mp4, aac, mpeg };
+enum class file_kind { unknown, wav, flac, ogg, mp4, aac, mpeg, aiff, asf, matroska };
 
 constexpr size_t kKindBytes = 16;  // needed by recognise_bytes
 

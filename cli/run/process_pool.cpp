@@ -2,6 +2,7 @@
 
 #include <sys/prctl.h>
 #include <sys/socket.h>
+#include <sys/time.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -16,6 +17,7 @@ namespace {
 using std::chrono::steady_clock;
 
 constexpr std::chrono::milliseconds kStopPatience{900};
+constexpr timeval kReplyPatience = {10, 0};  // from the start of a reply to its end
 
 // Runs in the new process. Closes its copies of the other workers' sockets, because otherwise those
 // workers would not notice the end of the command.
@@ -46,6 +48,7 @@ failure start_worker(process_pool &pool, worker_process &worker) {
         close_fd(worker.fd);
         return {system_sentence("The analysis process could not be started", code)};
     }
+    setsockopt(worker.fd, SOL_SOCKET, SO_RCVTIMEO, &kReplyPatience, sizeof kReplyPatience);
     ++pool.running;
     return {};
 }
@@ -70,7 +73,7 @@ void finish_input(const process_pool &pool, worker_process &worker, reply &&answ
     worker.deadline = time_point::max();
 }
 
-// Called when the worker has closed its socket or its reply was interrupted by a stop.
+// Called when the worker has closed its socket or its reply did not arrive whole.
 void reap(process_pool &pool, worker_process &worker) {
     kill(worker.pid, SIGKILL);
     const int status = wait_for_end(worker.pid);
@@ -99,7 +102,13 @@ void read_from(process_pool &pool, worker_process &worker) {
 
 bool assign(process_pool &pool, input &next) {
     const auto is_idle = [](const worker_process &worker) { return !worker.current; };
-    const auto worker = std::find_if(pool.workers.begin(), pool.workers.end(), is_idle);
+    const auto is_waiting = [](const worker_process &worker) {
+        return worker.pid > 0 && !worker.current;
+    };
+    auto worker = std::find_if(pool.workers.begin(), pool.workers.end(), is_waiting);
+    if (worker == pool.workers.end()) {
+        worker = std::find_if(pool.workers.begin(), pool.workers.end(), is_idle);
+    }
     if (worker == pool.workers.end()) return false;
     if (worker->pid < 0 && !next.refusal) {
         const failure not_started = start_worker(pool, *worker);
@@ -128,12 +137,15 @@ void end_workers(process_pool &pool, bool is_stop) {
 }
 
 void poll_workers(process_pool &pool, std::vector<pollfd> &watched, int wait_ms) {
-    const size_t others = watched.size();
-    for (const worker_process &worker : pool.workers) watched.push_back({worker.fd, POLLIN, 0});
+    size_t at = watched.size();
+    for (const worker_process &worker : pool.workers) {
+        // poll refuses more descriptors than the process may open, even if they are -1.
+        if (worker.fd >= 0) watched.push_back({worker.fd, POLLIN, 0});
+    }
     const bool is_ready = poll(watched.data(), watched.size(), wait_ms) > 0;
-    for (size_t i = 0; i < pool.workers.size(); ++i) {
-        worker_process &worker = pool.workers[i];
-        if (is_ready && watched[others + i].revents != 0) read_from(pool, worker);
+    for (worker_process &worker : pool.workers) {
+        const bool is_watched = worker.fd >= 0;
+        if (is_watched && watched[at++].revents != 0 && is_ready) read_from(pool, worker);
         if (worker.pid > 0 && steady_clock::now() >= worker.deadline) kill(worker.pid, SIGKILL);
     }
 }

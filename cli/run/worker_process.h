@@ -26,8 +26,8 @@ reply make_reply(const record &result, const options &opts);
 // Sends an input to a worker. A worker that has ended is noticed when its reply is received.
 void send_input(int fd, const input &next);
 
-// Waits until the whole reply has arrived. Returns false if the worker has ended or a signal
-// interrupts the wait.
+// Waits until the whole reply has arrived. Returns false if the worker has ended, the socket's time
+// limit has passed or a signal interrupts the wait.
 bool receive_reply(int fd, reply &answer);
 
 // Serves inputs until the other end of the socket is closed.
