@@ -107,7 +107,9 @@ failure watch(ffmpeg_process &process, int stop_fd, const output_check &check, i
         poll(watched, std::size(watched), process.message_fd < 0 ? 1 : kCheckMs);
         if (watched[1].revents != 0) return {"The analysis was stopped."};
         siginfo_t end{};
-        if (process.message_fd < 0) waitid(P_PID, process.pid, &end, WEXITED | WNOHANG | WNOWAIT);
+        if (process.message_fd < 0) {
+            waitid(P_PID, static_cast<id_t>(process.pid), &end, WEXITED | WNOHANG | WNOWAIT);
+        }
         const off_t before = std::exchange(file.st_size, 0);
         fstat(output, &file);
         if (file.st_size > before) {

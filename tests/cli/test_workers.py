@@ -3,6 +3,7 @@ import contextlib
 import math
 import os
 import re
+import resource
 import select
 import signal
 import subprocess
@@ -50,7 +51,10 @@ class Workers(Case):
             self.put(name, source=short_song(i) if i % 4 else song(seconds=40, seed=i))
         self.put("5.wav", b"RIFF")  # the only one that fails
         single = [self.run_json(name, status=int(name == "5.wav"))[0] for name in names]
-        for jobs in ("2", "32"):
+        limits = resource.getrlimit(resource.RLIMIT_NOFILE)
+        self.addCleanup(resource.setrlimit, resource.RLIMIT_NOFILE, limits)
+        resource.setrlimit(resource.RLIMIT_NOFILE, (200, limits[1]))
+        for jobs in ("2", "256"):  # the second is more than there may be open files
             self.assertEqual(self.run_json("-j", jobs, *names, status=1), single)
 
     def test_a_killed_worker_costs_its_file_only(self):
