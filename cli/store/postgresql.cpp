@@ -2,6 +2,7 @@
 #include <libpq-fe.h>
 
 #include <algorithm>
+#include <cctype>
 #include <cstdint>
 #include <memory>
 #include <string_view>
@@ -22,11 +23,16 @@ std::string message_of(const database &db) {
     return text;
 }
 
-// Returns the text with *** in place of each occurrence of the word.
+// Returns the text with *** in place of each occurrence of the word, but not of a part of a longer
+// word.
 std::string without(std::string text, const std::string &word) {
     if (word.empty()) return text;
-    for (size_t at = text.find(word); at != std::string::npos; at = text.find(word, at + 3)) {
-        text.replace(at, word.size(), "***");
+    const auto is_letter = [&](size_t i) { return isalnum(static_cast<uint8_t>(text[i])) != 0; };
+    for (size_t at = text.find(word); at != std::string::npos; at = text.find(word, at)) {
+        const size_t end = at + word.size();
+        const bool is_whole = (at == 0 || !is_letter(at - 1)) && !is_letter(end);
+        if (is_whole) text.replace(at, word.size(), "***");
+        at += is_whole ? 3 : 1;
     }
     return text;
 }

@@ -76,6 +76,10 @@ std::string quoted(const std::string &text) {
 
 std::string cell(const result_json &value) {
     if (value.is_string()) return quoted(value.get<std::string>());
+    if (value.is_number_float()) {  // the digits of JSON, without an exponent
+        const std::string digits = nlohmann::json(std::stod(value.dump())).dump();
+        return digits.substr(0, digits.find(".0", digits.size() - 2));
+    }
     if (!value.is_array()) return value.dump();
     std::string numbers;
     for (const result_json &item : value) numbers += (numbers.empty() ? "" : " ") + cell(item);
