@@ -2,8 +2,7 @@
 //
 // Input: a TAVO_CTX with ana, ana_len, ana_rate and onset. Output: a TAVO_BEAT_CTX, which lives for
 // one call to getBeatPosition.
-#ifndef TAVO_BEAT_BEAT_CTX_H
-#define TAVO_BEAT_BEAT_CTX_H
+#pragma once
 
 #include <pthread.h>
 
@@ -75,5 +74,3 @@ bool init_beat_ctx(const TAVO_CTX *ctx, bool with_signal, TAVO_BEAT_CTX *beat);
 inline int64_t analysis_length(const TAVO_CTX *ctx) {
     return ctx->ana != nullptr && ctx->ana_len > 0 ? ctx->ana_len : 0;
 }
-
-#endif

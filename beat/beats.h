@@ -3,8 +3,7 @@
 // Input: a TAVO_CTX with ana, ana_len, ana_rate and onset. Output: bpm, beat_count and beat_times
 // (ms from the start of the signal) in its TAVO_ONSET_CTX. Follows pcm/resample.h and precedes the
 // callback.
-#ifndef TAVO_BEAT_BEATS_H
-#define TAVO_BEAT_BEATS_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 
@@ -18,5 +17,3 @@ int32_t getBeatPosition(TAVO_CTX *ctx);
 // Releases the beats and the record itself. Null is ignored.
 void clearOnsetCtx(TAVO_ONSET_CTX *onset);
 }
-
-#endif

@@ -1,7 +1,6 @@
 // Stage 6: selects the beats from the peaks of the onset envelope. Follows beat/tempo.h,
 // beat/power_rise.h and beat/threshold.h, and precedes beat/beats.h.
-#ifndef TAVO_BEAT_CANDIDATES_H
-#define TAVO_BEAT_CANDIDATES_H
+#pragma once
 
 #include "beat/beat_ctx.h"
 
@@ -14,5 +13,3 @@ int32_t getBeatCandi_MT(TAVO_BEAT_CTX *beat, TAVO_ONSET_CTX *onset, float *out);
 
 // Returns an upper limit on the number of beats, which include those added in gaps.
 int64_t candidate_capacity(const TAVO_BEAT_CTX *beat);
-
-#endif

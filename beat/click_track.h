@@ -1,8 +1,7 @@
 // Writes the diagnostic click track: the analysed signal with a blip at every beat, as a mono
 // 16-bit WAV file. The public global fnamedec (include/tavo.h) holds its path. Called by
 // beat/beats.h.
-#ifndef TAVO_BEAT_CLICK_TRACK_H
-#define TAVO_BEAT_CLICK_TRACK_H
+#pragma once
 
 #include <cstdint>
 #include <cstdio>
@@ -21,5 +20,3 @@ void makeBlipTrack(const float *beats, int32_t count, int32_t sr, int64_t n, flo
 // Writes the click track of the instance to fnamedec. Does nothing if the path is empty, the file
 // cannot be created or memory runs out.
 void write_click_track(const TAVO_CTX *ctx);
-
-#endif

@@ -1,6 +1,5 @@
 // Part of stage 6: fills long gaps between beats with weaker peaks. Called by beat/candidates.h.
-#ifndef TAVO_BEAT_GAP_FILL_H
-#define TAVO_BEAT_GAP_FILL_H
+#pragma once
 
 #include "beat/beat_ctx.h"
 
@@ -26,5 +25,3 @@ int32_t bringMoreBeat(int32_t a, int32_t b, int32_t *dst, const int32_t *peaks, 
 // `peaks` must be ascending. Returns the number of beats added.
 int32_t fill_gaps(const TAVO_BEAT_CTX *beat, const PEAK_LIST *peaks, float span, float *out,
                   int32_t count);
-
-#endif

@@ -3,8 +3,7 @@
 // Input: the analysis signal. Output: TAVO_BEAT_CTX.onset_env, one value per hop (256 samples at
 // 11025 Hz), divided by the standard deviation of all values. Follows beat/beat_ctx.h and precedes
 // beat/tempo.h and beat/threshold.h.
-#ifndef TAVO_BEAT_ONSET_ENVELOPE_H
-#define TAVO_BEAT_ONSET_ENVELOPE_H
+#pragma once
 
 #include "beat/beat_ctx.h"
 #include "common/worker_group.h"
@@ -51,5 +50,3 @@ void _thd_cleanup(void *record);
 // the envelope cannot be computed.
 void compute_onset_envelope(TAVO_BEAT_CTX *beat, sample_view view, int32_t frame_size,
                             int32_t hop_size, const side_work *side);
-
-#endif

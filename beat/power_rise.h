@@ -2,8 +2,7 @@
 // second of relative quiet.
 //
 // Input: the analysis signal. Output: the samples where rises start. Precedes beat/candidates.h.
-#ifndef TAVO_BEAT_POWER_RISE_H
-#define TAVO_BEAT_POWER_RISE_H
+#pragma once
 
 #include "beat/beat_ctx.h"
 
@@ -18,5 +17,3 @@ int32_t detectPowerVariation(const double *signal, int32_t *flags, int64_t n);
 // ascending, or null. The caller must always free it. Returns the number of rises, or
 // TAVO_ERR_MEMORY if memory runs out.
 int32_t find_power_rises(sample_view view, int64_t n, int64_t **samples);
-
-#endif

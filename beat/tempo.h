@@ -1,7 +1,6 @@
 // Stage 5: estimates the tempo by autocorrelating up to a minute of the onset envelope. Follows
 // beat/onset_envelope.h and precedes beat/candidates.h.
-#ifndef TAVO_BEAT_TEMPO_H
-#define TAVO_BEAT_TEMPO_H
+#pragma once
 
 #include "beat/beat_ctx.h"
 
@@ -19,5 +18,3 @@ int32_t calc_bpm_acf(const double *x, int64_t nfft, int32_t D, int32_t L, double
 // Returns the tempo of the context's onset envelope, 30 to 200 BPM. If there is no dominant period,
 // returns 90; if memory runs out, TAVO_ERR_MEMORY.
 int32_t estimate_tempo(const TAVO_BEAT_CTX *beat);
-
-#endif

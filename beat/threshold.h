@@ -1,7 +1,6 @@
 // Stage 6: computes the adaptive threshold, a sliding 97th percentile of the onset envelope. The
 // window spans about four beats. Follows beat/tempo.h and precedes beat/candidates.h.
-#ifndef TAVO_BEAT_THRESHOLD_H
-#define TAVO_BEAT_THRESHOLD_H
+#pragma once
 
 #include "beat/beat_ctx.h"
 
@@ -34,5 +33,3 @@ void _thd_thres_cleanup(void *record);
 // Fills thr[F - 1] on four threads. `thr` must be zeroed and have at least one entry; `window` is
 // in analysis frames and `hop` in seconds. Returns 0, or TAVO_ERR_MEMORY if memory runs out.
 int32_t build_threshold(const TAVO_BEAT_CTX *beat, int32_t window, float hop, double *thr);
-
-#endif

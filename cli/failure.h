@@ -1,8 +1,7 @@
 // The result of a function that can fail. It converts to true if the function failed.
 //
 //     if (failure failed = write_file(target, content, force)) return failed;
-#ifndef TAVO_CLI_FAILURE_H
-#define TAVO_CLI_FAILURE_H
+#pragma once
 
 #include <string>
 
@@ -12,5 +11,3 @@ struct [[nodiscard]] failure {
 
     explicit operator bool() const { return !sentence.empty(); }
 };
-
-#endif

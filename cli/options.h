@@ -1,8 +1,7 @@
 // Parses the command line once.
 //
 // Input: argc and argv. Output: options, which every part of the command reads.
-#ifndef TAVO_CLI_OPTIONS_H
-#define TAVO_CLI_OPTIONS_H
+#pragma once
 
 #include <cstdint>
 #include <optional>
@@ -69,5 +68,3 @@ std::optional<int> parse_options(int argc, char **argv, options &out);
 
 // True if the only input is a file, not a folder or a list.
 bool takes_one_file(const options &opts);
-
-#endif

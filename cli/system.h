@@ -1,6 +1,5 @@
 // Helpers for file descriptors, signals and processes, shared by several parts of the command.
-#ifndef TAVO_CLI_SYSTEM_H
-#define TAVO_CLI_SYSTEM_H
+#pragma once
 
 #include <sys/types.h>
 
@@ -55,5 +54,3 @@ void note_temporary_file(const std::string &path);
 
 // Removes the file, if there is one. Safe in a signal handler.
 void remove_file(temporary_file &file);
-
-#endif

@@ -2,8 +2,7 @@
 //
 // Sizes are computed from durations and rates that files state. They are therefore 64-bit and
 // checked for overflow.
-#ifndef TAVO_COMMON_ALLOC_H
-#define TAVO_COMMON_ALLOC_H
+#pragma once
 
 #include <cstdlib>
 
@@ -70,5 +69,3 @@ uint8_t *allocate_buffer(int64_t bytes);
 // buffer. The pages stay allocated and read as zeros. Returns the end of the last page released, or
 // `begin` if the range holds no whole page.
 const uint8_t *release_pages(const uint8_t *begin, const uint8_t *end);
-
-#endif

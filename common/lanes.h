@@ -1,7 +1,6 @@
 // The compiler's vector types, each of which holds several numbers in one register. Each lane is
 // rounded as a single number would be. Used where independent data needs the same arithmetic.
-#ifndef TAVO_COMMON_LANES_H
-#define TAVO_COMMON_LANES_H
+#pragma once
 
 #include <cstdint>
 #include <cstring>
@@ -25,5 +24,3 @@ inline double_pair load_pair(const double *values) {
 inline void store_pair(double *values, double_pair pair) {
     memcpy(values, &pair, sizeof pair);
 }
-
-#endif

@@ -1,7 +1,6 @@
 // Limits on the files that can be analysed. The stages refuse files outside these limits; the
 // command prints the limits for the user.
-#ifndef TAVO_COMMON_LIMITS_H
-#define TAVO_COMMON_LIMITS_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 
@@ -10,5 +9,3 @@ constexpr int32_t kHeadBytes = TAVO_MIN_FILE_BYTES;  // bytes read to recognise 
 constexpr int32_t kMinRate = TAVO_MIN_RATE;          // Hz
 constexpr int32_t kMaxRate = TAVO_MAX_RATE;          // Hz, for all formats except FLAC
 constexpr int64_t kRefusedUnits = kUnitsPerSecond;   // streams up to this length are refused
-
-#endif

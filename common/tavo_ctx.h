@@ -3,8 +3,7 @@
 // The instance owns everything reachable through its pointers, except the callback. Decoding counts
 // time in 100-ns units (10,000,000 per second); results are in milliseconds. core/instance.h
 // creates and releases instances.
-#ifndef TAVO_COMMON_TAVO_CTX_H
-#define TAVO_COMMON_TAVO_CTX_H
+#pragma once
 
 #include <pthread.h>
 
@@ -95,5 +94,3 @@ inline int32_t load_flag(const int32_t *flag) {
 inline void store_flag(int32_t *flag, int32_t value) {
     __atomic_store_n(flag, value, __ATOMIC_RELEASE);
 }
-
-#endif

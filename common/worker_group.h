@@ -5,8 +5,7 @@
 // flags. A worker's thread entry calls run_worker, and its completion handler calls
 // worker_group_done. Another thread calls worker_group_run, which waits for all flags and joins
 // every worker. The results are complete when it returns.
-#ifndef TAVO_COMMON_WORKER_GROUP_H
-#define TAVO_COMMON_WORKER_GROUP_H
+#pragma once
 
 #include <pthread.h>
 
@@ -47,5 +46,3 @@ int32_t worker_lock_create(pthread_mutex_t **mutex, pthread_cond_t **cond);
 
 // Destroys and frees the mutex and the condition and sets both pointers to null. Null is ignored.
 void worker_lock_release(pthread_mutex_t **mutex, pthread_cond_t **cond);
-
-#endif

@@ -2,8 +2,7 @@
 //
 // Input: a TAVO_PARAM. Output: a TAVO_CTX with its sub-contexts and a decoding plan. Follows
 // pcm/decode.h and precedes core/lifecycle.h.
-#ifndef TAVO_CORE_INSTANCE_H
-#define TAVO_CORE_INSTANCE_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 
@@ -33,5 +32,3 @@ inline bool finds_beats(int32_t mode) {
 inline bool finds_highlight(int32_t mode) {
     return mode == TAVO_MODE_HIGHLIGHT || mode == TAVO_MODE_BOTH;
 }
-
-#endif

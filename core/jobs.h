@@ -4,8 +4,7 @@
 // Input: a TAVO_CTX with the arguments of tavo_analyze. Output: a TAVO_INFO, passed to the callback
 // exactly once, after the final state is set. Follows core/lifecycle.h. The host provides
 // the callback; see for example jni/tavo_jni.h.
-#ifndef TAVO_CORE_JOBS_H
-#define TAVO_CORE_JOBS_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 
@@ -22,5 +21,3 @@ void *analyzeHighlight(void *arg);      // same as analyzeHighlightOnly, for dir
 // instance without an onset context reports a failure.
 int32_t analyzeOnsetenv(TAVO_CTX *ctx);
 }
-
-#endif

@@ -3,8 +3,7 @@
 //
 // Input: the host's calls (include/tavo.h). Output: a job (core/jobs.h) on its own thread. Follows
 // core/instance.h and precedes core/jobs.h.
-#ifndef TAVO_CORE_LIFECYCLE_H
-#define TAVO_CORE_LIFECYCLE_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 
@@ -24,5 +23,3 @@ int32_t _tavo_quit(TAVO_CTX *ctx);
 // ended and then signals tavo_cond.
 void *_thd_quit_wait(void *arg);
 }
-
-#endif

@@ -1,7 +1,6 @@
 // Discrete Fourier transforms of any size. Real and imaginary parts are in separate arrays. The
 // forward transform is unscaled; the inverse divides by n. Used by beat/tempo.h for one excerpt.
-#ifndef TAVO_DSP_DFT_H
-#define TAVO_DSP_DFT_H
+#pragma once
 
 #include <cstdint>
 
@@ -16,5 +15,3 @@ int32_t tavo_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_inpu
 // TAVO_ERR_MEMORY with nothing changed.
 int32_t tavo_inverse_dft(double *re, double *im, int64_t n, int64_t m, int32_t real_input);
 }
-
-#endif

@@ -1,7 +1,6 @@
 // Unscaled fast Fourier transform of doubles. Real and imaginary parts are in separate arrays. Used
 // by beat/onset_envelope.h for every analysis frame, and by dsp/dft.h.
-#ifndef TAVO_DSP_FFT_H
-#define TAVO_DSP_FFT_H
+#pragma once
 
 #include <cstddef>
 #include <cstdint>
@@ -54,5 +53,3 @@ struct frame_pair {
 // alone with tavo_fft_proc. `n` is the size passed to tavo_fft_init. scratch[2 * n] is overwritten.
 void compute_frame_powers(const frame_pair &frames, int32_t n, const TAVO_FFT_CTX *ctx,
                           double_pair *scratch, double_pair *powers);
-
-#endif

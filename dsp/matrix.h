@@ -1,6 +1,5 @@
 // Multiplies matrices stored as row pointers. For direct callers; the library does not use it.
-#ifndef TAVO_DSP_MATRIX_H
-#define TAVO_DSP_MATRIX_H
+#pragma once
 
 #include <cstdint>
 
@@ -12,5 +11,3 @@ extern "C" {
 int32_t MultiplyMtxs(int32_t rows, int32_t cols, int32_t inner, const float *const *a,
                      const float *const *b, double *const *d);
 }
-
-#endif

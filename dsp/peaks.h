@@ -1,8 +1,7 @@
 // Finds peaks. A peak is an index, neither the first nor the last, whose value is greater than both
 // neighbouring values. The caller owns every array. Used by highlight/search.h for the rising edges
 // of the loudness curve and by beat/candidates.h for the peaks of the onset envelope.
-#ifndef TAVO_DSP_PEAKS_H
-#define TAVO_DSP_PEAKS_H
+#pragma once
 
 #include <cstddef>
 #include <cstdint>
@@ -44,5 +43,3 @@ int32_t findNearestIndex(const int32_t *list, int32_t target, int32_t n);
 // Returns the first index at which x[n] equals `value`, or 0 if the value does not occur.
 int32_t findIndex(const double *x, int32_t n, double value);
 }
-
-#endif

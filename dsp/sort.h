@@ -1,7 +1,6 @@
 // Comparators for qsort and an in-place quicksort of doubles. The comparators never report
 // equality. Used by dsp/peaks.h and beat/power_rise.h.
-#ifndef TAVO_DSP_SORT_H
-#define TAVO_DSP_SORT_H
+#pragma once
 
 #include <cstdint>
 
@@ -22,5 +21,3 @@ int32_t partition(int32_t lo, int32_t hi, double *a);
 // Exchanges two 8-byte values.
 void swap(void *a, void *b);
 }
-
-#endif

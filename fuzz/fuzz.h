@@ -1,7 +1,6 @@
 // Code that the fuzzers share. A fuzzer turns an input into valid arguments and aborts if the
 // library breaks a promise. Any audio file can be an input. Its last bytes select the arguments.
-#ifndef TAVO_FUZZ_FUZZ_H
-#define TAVO_FUZZ_FUZZ_H
+#pragma once
 
 #include <fuzzer/FuzzedDataProvider.h>
 #include <sys/mman.h>
@@ -70,5 +69,3 @@ inline std::string write_file(const std::vector<uint8_t> &bytes) {
 }  // namespace fuzz
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size);
-
-#endif

@@ -2,8 +2,7 @@
 //
 // Input: a TAVO_CTX with pcm, pcm_bytes, fmt and duration. Output: hl.hl_pos in milliseconds.
 // Follows pcm/decode.h and precedes the callback or, in mode 2, pcm/from_highlight.h.
-#ifndef TAVO_HIGHLIGHT_POSITION_H
-#define TAVO_HIGHLIGHT_POSITION_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 
@@ -16,5 +15,3 @@ uint32_t getHLPosition(TAVO_CTX *ctx);
 // Releases the loudness curve and the context itself. Null is ignored.
 void clearHighlgihtCtx(TAVO_HL_CTX *hl);
 }
-
-#endif

@@ -3,8 +3,7 @@
 // Input: 16-bit mono PCM at the source rate. Output: TAVO_HL_CTX.power, one float every 2 s, each
 // measured over a window of 6 s. A value is 10 log10(mean square + 1): 0 for silence, about 3.01
 // for full scale. Precedes highlight/search.h.
-#ifndef TAVO_HIGHLIGHT_POWER_ENVELOPE_H
-#define TAVO_HIGHLIGHT_POWER_ENVELOPE_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 
@@ -31,5 +30,3 @@ float window_power(const int16_t *pcm, int64_t window);
 // Computes window_power for `count` windows of 3 * `hop` samples that start one hop apart, and
 // stores the values in out[count]. `pcm` has (`count` + 2) * `hop` samples.
 void overlapping_powers(const int16_t *pcm, int64_t hop, int64_t count, float *out);
-
-#endif

@@ -3,8 +3,7 @@
 //
 // Input and output: indexes into the loudness curve, whose points are 2 s apart. Called by
 // highlight/search.h.
-#ifndef TAVO_HIGHLIGHT_REGION_H
-#define TAVO_HIGHLIGHT_REGION_H
+#pragma once
 
 #include <cstdint>
 
@@ -18,5 +17,3 @@ uint32_t tavo_select_highlight_region(const float *norm, int32_t n, int32_t len_
                                       int32_t nv, const int32_t *valleys, const int32_t *pairs,
                                       int32_t nseg, float mean, float std);
 }
-
-#endif

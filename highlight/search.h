@@ -2,8 +2,7 @@
 //
 // Input: a TAVO_HL_CTX with its loudness curve. Output: a time in milliseconds, a multiple of 2000.
 // Follows highlight/power_envelope.h and precedes highlight/tune.h.
-#ifndef TAVO_HIGHLIGHT_SEARCH_H
-#define TAVO_HIGHLIGHT_SEARCH_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 
@@ -13,5 +12,3 @@ extern "C" {
 // the song in whole seconds.
 uint32_t _get_HL_simple(TAVO_HL_CTX *hl, int32_t duration_s);
 }
-
-#endif

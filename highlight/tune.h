@@ -2,8 +2,7 @@
 //
 // Input: 16-bit mono PCM at the source rate and a start in milliseconds. Output: the tuned start,
 // on a grid of 400 ms. Follows highlight/search.h and precedes highlight/position.h.
-#ifndef TAVO_HIGHLIGHT_TUNE_H
-#define TAVO_HIGHLIGHT_TUNE_H
+#pragma once
 
 #include <cstdint>
 
@@ -17,5 +16,3 @@ uint32_t _tune_HL_simple(const int16_t *pcm, int32_t rate, uint32_t start_ms, ui
 // Returns the number of samples, from the start of the song, that _tune_HL_simple needs for
 // start_ms.
 int64_t tune_end(int32_t rate, uint32_t start_ms);
-
-#endif

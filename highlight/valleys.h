@@ -1,6 +1,5 @@
 // Part of stage 7b: finds the quiet stretches of the loudness curve. Called by highlight/search.h.
-#ifndef TAVO_HIGHLIGHT_VALLEYS_H
-#define TAVO_HIGHLIGHT_VALLEYS_H
+#pragma once
 
 #include <cstdint>
 
@@ -15,5 +14,3 @@ extern "C" {
 int32_t tavo_find_valley(const float *values, int32_t n, int32_t *out, float mean, float std,
                          float hop_s);
 }
-
-#endif

@@ -3,8 +3,7 @@
 // Input: calls to the native methods of com.kestu.tavo.Tavo, for one instance per process. Output:
 // one call to the static method postEventFromNative per job, on the job's worker thread. Follows
 // include/tavo.h and precedes java/com/kestu/tavo/Tavo.java.
-#ifndef TAVO_JNI_TAVO_JNI_H
-#define TAVO_JNI_TAVO_JNI_H
+#pragma once
 
 #include <jni.h>
 #include <pthread.h>
@@ -59,5 +58,3 @@ JNIEXPORT jstring JNICALL Java_com_kestu_tavo_Tavo_reason(JNIEnv *env, jclass ho
 // stored class.
 void tavocallback(TAVO_INFO *info);
 }
-
-#endif

@@ -3,8 +3,7 @@
 //
 // Input: the codec library's reader or demuxer and its decoder, both stored in the handle. Output:
 // PCM in the handle's queue. Called by the format sources.
-#ifndef TAVO_MEDIA_SOURCE_CODEC_SOURCE_H
-#define TAVO_MEDIA_SOURCE_CODEC_SOURCE_H
+#pragma once
 
 #include "common/limits.h"
 #include "media_source/mtsrc_ctx.h"
@@ -76,5 +75,3 @@ int32_t codec_source_get_frm(const codec_source &source, mtsrc_ctx *src, int32_t
 int32_t codec_source_seek(const codec_source &source, mtsrc_ctx *src, int64_t position,
                           int64_t *reached);
 int32_t codec_source_reset(const codec_source &source, mtsrc_ctx *src);
-
-#endif

@@ -1,8 +1,7 @@
 // Part of stage 1: AAC and MPEG audio, the codecs that occur both as bare streams and in MP4.
 //
 // Input: a stream's properties, from its reader or MP4 track. Output: a decoder in the handle.
-#ifndef TAVO_MEDIA_SOURCE_CODECS_H
-#define TAVO_MEDIA_SOURCE_CODECS_H
+#pragma once
 
 #include "media_source/codec_source.h"
 
@@ -15,5 +14,3 @@ extern const codec_ops kMpegCodec;
 int32_t create_aac_decoder(mtsrc_ctx *src, int32_t sample_rate, int32_t channels, int64_t duration);
 int32_t create_mpeg_decoder(mtsrc_ctx *src, int32_t sample_rate, int32_t channels,
                             int64_t duration);
-
-#endif

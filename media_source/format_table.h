@@ -1,6 +1,5 @@
 // Maps a file's type code to the operations of its format source. Called by mtsrc.cpp.
-#ifndef TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
-#define TAVO_MEDIA_SOURCE_FORMAT_TABLE_H
+#pragma once
 
 #include "media_source/mtsrc_ctx.h"
 
@@ -15,5 +14,3 @@ struct format_ops {
 
 // Returns the operations, or null if no format source reads files of this type.
 const format_ops *format_ops_of(int32_t type);
-
-#endif

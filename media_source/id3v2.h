@@ -1,6 +1,5 @@
 // Length of an ID3v2 tag. Tags occur before and inside audio streams. Used by the probes.
-#ifndef TAVO_MEDIA_SOURCE_ID3V2_H
-#define TAVO_MEDIA_SOURCE_ID3V2_H
+#pragma once
 
 #include <cstdint>
 
@@ -12,5 +11,3 @@ inline int64_t id3v2_length(const uint8_t *header) {
     return kId3HeaderBytes + ((header[6] & 0x7F) << 21) + ((header[7] & 0x7F) << 14) +
            ((header[8] & 0x7F) << 7) + (header[9] & 0x7F);
 }
-
-#endif

@@ -5,8 +5,7 @@
 /// Input: a path. Output: PCM at the stream's own sample rate, in native byte order. Called by
 /// pcm/decode.h. A source is used by one thread at a time; different sources share nothing. The
 /// handle, mtsrc_init, mtsrc_getstream and mtsrc_deinit are declared in tavo.h.
-#ifndef TAVO_MEDIA_SOURCE_MTSRC_H
-#define TAVO_MEDIA_SOURCE_MTSRC_H
+#pragma once
 
 #include "include/tavo.h"
 #include "media_source/mtsrc_io.h"
@@ -70,5 +69,3 @@ int32_t mtsrc_probe_aac(const uint8_t *head, const mtsrc_io *io, mtsrc_file *fil
 int32_t mtsrc_probe_mpeg(const uint8_t *head, const mtsrc_io *io, mtsrc_file *file);
 /// @}
 }
-
-#endif

@@ -2,8 +2,7 @@
 //
 // mtsrc.cpp allocates the handle, recognises the file and calls the format source through the
 // pointers open, close, get_frm, seek and reset.
-#ifndef TAVO_MEDIA_SOURCE_MTSRC_CTX_H
-#define TAVO_MEDIA_SOURCE_MTSRC_CTX_H
+#pragma once
 
 #include <pthread.h>
 
@@ -103,5 +102,3 @@ int32_t aac_get_hz(void *reader, void *decoder);
 int32_t get_mp4_audiostream(const void *info);
 int32_t get_ogg_audiostream(const void *info);
 }
-
-#endif

@@ -2,8 +2,7 @@
 /// File access for stage 1. The format probes and the codec library access the file only through
 /// the callbacks in mtsrc_io. The codec library is a separate binary, so the layout of mtsrc_io is
 /// fixed.
-#ifndef TAVO_MEDIA_SOURCE_MTSRC_IO_H
-#define TAVO_MEDIA_SOURCE_MTSRC_IO_H
+#pragma once
 
 #include <cstddef>
 #include <cstdint>
@@ -68,5 +67,3 @@ inline void mtsrc_file_callbacks(mtsrc_io *io) {
     io->skip = mtsrc_file_skip;
     io->size = mtsrc_file_size;
 }
-
-#endif

@@ -3,8 +3,7 @@
 //
 // Input: the interleaved 16-bit PCM of one compressed frame at a time. Output: mono PCM, as many
 // bytes as the caller requests.
-#ifndef TAVO_MEDIA_SOURCE_PCM_QUEUE_H
-#define TAVO_MEDIA_SOURCE_PCM_QUEUE_H
+#pragma once
 
 #include "media_source/mtsrc_ctx.h"
 
@@ -36,5 +35,3 @@ void pcm_queue_release_pages(const mtsrc_ctx *src);
 // incomplete last sample.
 int32_t pcm_first_channel(uint8_t *dst, const uint8_t *pcm, int32_t bytes, int32_t channels);
 int32_t pcm_mean_of_two(uint8_t *dst, const uint8_t *pcm, int32_t bytes, int32_t channels);
-
-#endif

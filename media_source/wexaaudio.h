@@ -10,8 +10,7 @@
 // A "frame" is whatever the library's reader passes to its own decoder: compressed bytes, or PCM
 // that the reader has already decoded and the decoder only copies. A source looks only at the byte
 // count.
-#ifndef TAVO_MEDIA_SOURCE_WEXAAUDIO_H
-#define TAVO_MEDIA_SOURCE_WEXAAUDIO_H
+#pragma once
 
 #include <cstddef>
 #include <cstdint>
@@ -300,5 +299,3 @@ int32_t xvorbisd_decode(void *decoder, const wexa_frame *frame, wexa_output *out
 void xvorbisd_reset(void *decoder);
 void xvorbisd_delete(void *decoder);
 }
-
-#endif

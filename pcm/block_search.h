@@ -2,8 +2,7 @@
 //
 // Input: the block and the offsets to test. Output: an offset. Called by pcm/stitch.cpp to find
 // splice points and by pcm/from_highlight.cpp to find the position that a seek reached.
-#ifndef TAVO_PCM_BLOCK_SEARCH_H
-#define TAVO_PCM_BLOCK_SEARCH_H
+#pragma once
 
 #include <cstdint>
 
@@ -21,5 +20,3 @@ struct offset_range {
 // block, or kNotFound if there is none.
 int64_t find_lowest(const uint8_t *pcm, offset_range range, const uint8_t *block);
 int64_t find_highest(const uint8_t *pcm, offset_range range, const uint8_t *block);
-
-#endif

@@ -3,8 +3,7 @@
 // Input: a plan made by pcm/decode_plan.h. Output: pcm_bytes bytes in TAVO_CTX.pcm. The segments
 // are decoded in parallel and joined where their overlaps contain the same bytes (pcm/stitch.h).
 // Follows pcm/decode_plan.h and precedes highlight/position.h and pcm/resample.h.
-#ifndef TAVO_PCM_DECODE_H
-#define TAVO_PCM_DECODE_H
+#pragma once
 
 #include "pcm/decode_plan.h"
 #include "pcm/stitch.h"
@@ -24,5 +23,3 @@ void thd_cleanup(void *seg);
 // Same as DecodePcmMT, but `pages` determines what happens to the segments' buffers. Jobs pass
 // segment_pages::released.
 int64_t decode_segments(TAVO_CTX *ctx, void *dst, int64_t dst_capacity, segment_pages pages);
-
-#endif

@@ -6,8 +6,7 @@
 //
 // The stream is divided into one or four segments, each with its own media source, buffer and
 // thread. Each segment except the last is decoded two seconds past its end.
-#ifndef TAVO_PCM_DECODE_PLAN_H
-#define TAVO_PCM_DECODE_PLAN_H
+#pragma once
 
 #include "common/tavo_ctx.h"
 #include "media_source/mtsrc.h"
@@ -63,5 +62,3 @@ int32_t construct_decbuf(TAVO_CTX *ctx, int64_t start);
 // Returns TAVO_OK if the stream can be analysed. Otherwise returns TAVO_ERR_SHORT,
 // TAVO_ERR_LOW_RATE or, if the byte count overflows, TAVO_ERR_FORMAT.
 int32_t check_stream(const mtsrc_format &format);
-
-#endif

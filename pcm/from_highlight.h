@@ -4,8 +4,7 @@
 // start that was actually used. `pcm` is always released. The PCM is cut at the position that a
 // seek to the start reaches. If that position cannot be found in the PCM, the stream is decoded
 // again from that position. Follows highlight/position.h and precedes beat/beats.h.
-#ifndef TAVO_PCM_FROM_HIGHLIGHT_H
-#define TAVO_PCM_FROM_HIGHLIGHT_H
+#pragma once
 
 #include "pcm/decode.h"
 
@@ -26,5 +25,3 @@ int32_t _compare_decoded(TAVO_DECSEG *seg, const int16_t *pcm, int64_t *off);
 // Same as tavo_get_from_here, but `pages` determines what happens to the segments' buffers after a
 // second decoding.
 int32_t continue_from_highlight(TAVO_CTX *ctx, int64_t pos, segment_pages pages);
-
-#endif

@@ -3,8 +3,7 @@
 // Input: a media source that has been positioned. Output: bytes of 16-bit mono PCM. Called by
 // pcm/decode.cpp to decode a segment and by pcm/from_highlight.cpp to decode some PCM at the
 // highlight.
-#ifndef TAVO_PCM_READ_PCM_H
-#define TAVO_PCM_READ_PCM_H
+#pragma once
 
 #include "media_source/mtsrc.h"
 
@@ -14,5 +13,3 @@ constexpr int64_t kReadBytes = 8192;  // size of the largest single read
 // source fails. *got is the number of bytes read so far, updated after each read. The bytes of a
 // failed read do not count.
 void read_pcm(mtsrc_ctx *src, uint8_t *dst, int64_t capacity, int64_t *got);
-
-#endif

@@ -2,8 +2,7 @@
 //
 // Input: 16-bit mono PCM at the stream's rate. Output: doubles on the 16-bit scale at the analysis
 // rate. Follows pcm/decode.h and precedes beat/beats.h.
-#ifndef TAVO_PCM_RESAMPLE_H
-#define TAVO_PCM_RESAMPLE_H
+#pragma once
 
 #include "pcm/resample_block.h"
 #include "pcm/resample_sinc.h"
@@ -22,5 +21,3 @@ int32_t dorn_resampler_run(const int16_t *pcm, int64_t bytes, int32_t source_rat
 // be null. The output may reuse its memory.
 int32_t convert_and_free(int16_t *pcm, int64_t bytes, int32_t source_rate, int32_t ana_rate,
                          int64_t *out_len, double **out);
-
-#endif

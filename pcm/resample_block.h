@@ -1,8 +1,7 @@
 // Stage 3 for the ratios 1, 2, 3 and 4: averages blocks of samples on four threads.
 //
 // Input: 16-bit mono PCM. Output: doubles on the 16-bit scale. Called by pcm/resample.cpp.
-#ifndef TAVO_PCM_RESAMPLE_BLOCK_H
-#define TAVO_PCM_RESAMPLE_BLOCK_H
+#pragma once
 
 #include <pthread.h>
 
@@ -54,5 +53,3 @@ int32_t whole_ratio(float ratio);
 // Same as resamplePcmMonoMT, but the lock must exist. At ratio 4, `in` and `out` may be the same
 // memory. Returns false if memory runs out.
 bool average_on_threads(const int16_t *in, int64_t count, float ratio, double *out, int64_t n);
-
-#endif

@@ -1,8 +1,7 @@
 // Stage 3 for ratios other than 1, 2, 3 and 4: interpolates with a windowed sinc in 961 phases.
 //
 // Input: interleaved 16-bit PCM. Output: the same, at the target rate. Called by pcm/resample.cpp.
-#ifndef TAVO_PCM_RESAMPLE_SINC_H
-#define TAVO_PCM_RESAMPLE_SINC_H
+#pragma once
 
 #include <cstddef>
 #include <cstdint>
@@ -42,5 +41,3 @@ int64_t convert_frames(const dorn_resampler_state *state, const int16_t *in, int
 // Rounds `sum` to the nearest integer, with halves rounded up. Returns the low 16 bits of the
 // result.
 int16_t wrap_sample(float sum);
-
-#endif

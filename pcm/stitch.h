@@ -2,8 +2,7 @@
 //
 // Input: the segments, whose buffers hold 16-bit mono PCM. Output: one buffer of PCM. Called by
 // pcm/decode.cpp. Precedes highlight/position.h and pcm/resample.h.
-#ifndef TAVO_PCM_STITCH_H
-#define TAVO_PCM_STITCH_H
+#pragma once
 
 #include "common/alloc.h"
 #include "pcm/decode_plan.h"
@@ -31,5 +30,3 @@ inline int64_t second_bytes(int32_t rate) {
 // the number of bytes written, or 0 if any segment is empty.
 int64_t stitch_segments(const TAVO_DECSEG *seg, int32_t count, int32_t rate, uint8_t *dst,
                         int64_t capacity, segment_pages pages);
-
-#endif

@@ -2,8 +2,7 @@
 //
 // Input: a file, and the arguments that describe the output. Output: what the program writes to
 // standard output. Used by song_file.h and write/sound_files.h in a worker process.
-#ifndef TAVO_CLI_INPUT_FFMPEG_H
-#define TAVO_CLI_INPUT_FFMPEG_H
+#pragma once
 
 #include <cstdint>
 #include <functional>
@@ -36,5 +35,3 @@ constexpr int kIdleSeconds = 30;
 
 // An ffmpeg filter that starts the timeline at 0 and fills gaps with silence, as players do.
 constexpr const char *kPlayerTimeFilter = "aresample=async=1:first_pts=0";
-
-#endif

@@ -1,8 +1,7 @@
 // Finds the files to analyse, one at a time, in the order of the command line.
 //
 // Input: the files, folders and lists in the options. Output: one input per file. Used by main.cpp.
-#ifndef TAVO_CLI_INPUT_INPUTS_H
-#define TAVO_CLI_INPUT_INPUTS_H
+#pragma once
 
 #include <sys/types.h>
 
@@ -67,5 +66,3 @@ enum class supply_state {
 // input whose marker file or clip would replace that of another input get a refusal. Memory use
 // grows with the number of folders and output files, not with the length of a list.
 supply_state next_input(input_supply &supply, input &out);
-
-#endif

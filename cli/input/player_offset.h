@@ -3,8 +3,7 @@
 //
 // Input: an MP3 or MP4 file. Output: milliseconds for run/record.h. docs/FORMATS.md lists the
 // offsets. Used by run/analyse.h.
-#ifndef TAVO_CLI_INPUT_PLAYER_OFFSET_H
-#define TAVO_CLI_INPUT_PLAYER_OFFSET_H
+#pragma once
 
 #include <cstdint>
 #include <string>
@@ -12,5 +11,3 @@
 // Returns how far the library's times are ahead of a player's. `rate` and `channels` describe the
 // library's stream. Returns 0 for other formats, and if the file states no delay or cannot be read.
 double find_player_offset_ms(const std::string &path, int32_t rate, int32_t channels);
-
-#endif

@@ -3,8 +3,7 @@
 //
 // Input: a path or bytes. Output: a file_kind, or a sentence. Used by inputs.h, song_file.h,
 // run/analyse.h and report/report.h; player_offset.h uses the functions that read bytes.
-#ifndef TAVO_CLI_INPUT_RECOGNISE_H
-#define TAVO_CLI_INPUT_RECOGNISE_H
+#pragma once
 
 #include <cstdint>
 #include <string>
@@ -45,5 +44,3 @@ std::string explain_refusal(const std::string &path, int32_t code, const TAVO_ST
 
 // Returns the reason why an analysis received no audio or, with has_audio, only part of it.
 std::string explain_lost_audio(const std::string &path, bool has_audio);
-
-#endif

@@ -1,6 +1,5 @@
 // A part of the inputs, for schedulers that run one command many times: --shard.
-#ifndef TAVO_CLI_INPUT_SHARD_H
-#define TAVO_CLI_INPUT_SHARD_H
+#pragma once
 
 #include <cstdint>
 #include <optional>
@@ -25,5 +24,3 @@ failure read_shard(const std::string &words, shard &out);
 // True if the file belongs to the part. A hash of the path's bytes decides, so every machine gets
 // the same answer.
 bool in_shard(const shard &of, const std::string &path);
-
-#endif

@@ -3,8 +3,7 @@
 //
 // Input: a path that the user named. Output: a path for the library. Used by inputs.h,
 // run/analyse.h, run/worker_process.h and write/sound_files.h.
-#ifndef TAVO_CLI_INPUT_SONG_FILE_H
-#define TAVO_CLI_INPUT_SONG_FILE_H
+#pragma once
 
 #include <string>
 
@@ -34,5 +33,3 @@ failure raise_song(const std::string &path, const options &opts, int stop_fd, co
 
 // May be called twice.
 void close_song(song_file &song);
-
-#endif

@@ -2,8 +2,7 @@
 //
 // Input: a record (run/record.h) and its view (song_view.h). Output: HTML files that work offline.
 // Follows run/analyse.h. run/worker_process.h writes the pages, run/ordered_output.h the index.
-#ifndef TAVO_CLI_REPORT_REPORT_H
-#define TAVO_CLI_REPORT_REPORT_H
+#pragma once
 
 #include <cstdint>
 #include <string>
@@ -33,5 +32,3 @@ std::string failed_report_row(const record &result);
 failure begin_report_index(output_file &index, const options &opts);
 failure add_report_row(output_file &index, const std::string &row);
 failure finish_report_index(output_file &index, const options &opts);
-
-#endif

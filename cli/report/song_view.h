@@ -2,8 +2,7 @@
 // and web/ use it.
 //
 // Input: a record (run/record.h). Output: JSON. Precedes report/report.h.
-#ifndef TAVO_CLI_REPORT_SONG_VIEW_H
-#define TAVO_CLI_REPORT_SONG_VIEW_H
+#pragma once
 
 #include "cli/failure.h"
 #include "cli/run/record.h"
@@ -19,5 +18,3 @@
 // "region_end_ms" the end of the region to show. The script converts times to a player's. The
 // caller adds the sound as "audio" (a URL) or "embedded" (base64).
 failure read_song_view(const record &result, int stop_fd, result_json &view);
-
-#endif

@@ -2,8 +2,7 @@
 //
 // Input: a path and options. Output: a record. Follows input/song_file.h; precedes write/format.h.
 // Runs in a worker process, which has at most one instance at a time.
-#ifndef TAVO_CLI_RUN_ANALYSE_H
-#define TAVO_CLI_RUN_ANALYSE_H
+#pragma once
 
 #include <string>
 
@@ -14,5 +13,3 @@
 // Returns after the job has ended. If stop_fd becomes readable, the job is stopped. If the path
 // could be opened, `song` receives the sound that was analysed, and the caller closes it.
 record analyse(const std::string &path, const options &opts, int stop_fd, song_file &song);
-
-#endif

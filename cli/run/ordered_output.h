@@ -3,8 +3,7 @@
 // done, files per minute and the time left.
 //
 // Input: replies of worker processes. Used by main.cpp.
-#ifndef TAVO_CLI_RUN_ORDERED_OUTPUT_H
-#define TAVO_CLI_RUN_ORDERED_OUTPUT_H
+#pragma once
 
 #include <chrono>
 #include <cstddef>
@@ -47,5 +46,3 @@ void draw_progress(ordered_output &output);
 // Finishes the report's index and reports output errors and a stop. Call it after the last
 // reply. Returns the exit status.
 int finish_output(ordered_output &output, const options &opts);
-
-#endif

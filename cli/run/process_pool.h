@@ -4,8 +4,7 @@
 // The command and a worker are connected by a socket pair. When the command closes its end for
 // writing, the worker stops its analysis and ends. When a worker ends, the command reads
 // end-of-file from it. The command is single-threaded, so that it can fork at any moment.
-#ifndef TAVO_CLI_RUN_PROCESS_POOL_H
-#define TAVO_CLI_RUN_PROCESS_POOL_H
+#pragma once
 
 #include <poll.h>
 #include <sys/types.h>
@@ -56,5 +55,3 @@ void end_workers(process_pool &pool, bool is_stop);
 // arrives, or wait_ms have passed. Receives the replies, kills workers past their deadline and
 // reaps those that have ended. Appends the workers to `watched`.
 void poll_workers(process_pool &pool, std::vector<pollfd> &watched, int wait_ms);
-
-#endif

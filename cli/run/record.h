@@ -1,7 +1,6 @@
 // The result of one file. Follows analyse.h; precedes write/format.h, write/markers.h and
 // report/report.h, which write it.
-#ifndef TAVO_CLI_RUN_RECORD_H
-#define TAVO_CLI_RUN_RECORD_H
+#pragma once
 
 #include <algorithm>
 #include <cstdint>
@@ -67,5 +66,3 @@ inline bool has_refinement(const record &result) {
 inline bool is_refined(const record &result) {
     return result.hl_pos_ms % TAVO_LOUDNESS_HOP_MS != 0;
 }
-
-#endif

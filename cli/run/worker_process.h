@@ -4,8 +4,7 @@
 // Input: one input at a time, from process_pool.h. Output: a reply to each, for ordered_output.h.
 // Each message on the socket is a CBOR object, preceded by its size. Its strings may contain any
 // bytes.
-#ifndef TAVO_CLI_RUN_WORKER_PROCESS_H
-#define TAVO_CLI_RUN_WORKER_PROCESS_H
+#pragma once
 
 #include <string>
 
@@ -32,5 +31,3 @@ bool receive_reply(int fd, reply &answer);
 
 // Serves inputs until the other end of the socket is closed.
 void serve_inputs(int fd, const options &opts);
-
-#endif

@@ -2,8 +2,7 @@
 // differs between SQLite and PostgreSQL.
 //
 // Input: a location, statements and their values. Output: rows. Used by store/store.h.
-#ifndef TAVO_CLI_STORE_DATABASE_H
-#define TAVO_CLI_STORE_DATABASE_H
+#pragma once
 
 #include <functional>
 #include <optional>
@@ -35,5 +34,3 @@ struct database_kind {
 
 // In sqlite.cpp; has a null address if the program was built without SQLite.
 extern const database_kind sqlite_database __attribute__((weak));
-
-#endif

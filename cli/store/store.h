@@ -4,8 +4,7 @@
 // Input: results as JSON (write/format.h). Output: one row for each song and set of parameters. A
 // batch of rows is one transaction, so a command that is killed loses at most the open batch and
 // leaves no row half-written. Used by main.cpp, in the command's own process.
-#ifndef TAVO_CLI_STORE_STORE_H
-#define TAVO_CLI_STORE_STORE_H
+#pragma once
 
 #include <chrono>
 #include <cstdint>
@@ -71,5 +70,3 @@ failure read_next(store &db, stored_song &song, bool &found);
 // Commits the last batch. Results that could not be stored are written to standard output as JSON.
 // summary receives one line for the user.
 failure close_store(store &db, std::string &summary);
-
-#endif

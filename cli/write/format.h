@@ -2,8 +2,7 @@
 //
 // Input: a record (run/record.h). Output: text, which run/ordered_output.h writes, or JSON. Follows
 // run/analyse.h.
-#ifndef TAVO_CLI_WRITE_FORMAT_H
-#define TAVO_CLI_WRITE_FORMAT_H
+#pragma once
 
 #include <cstdint>
 #include <nlohmann/json_fwd.hpp>
@@ -39,5 +38,3 @@ std::string json_record(const record &result);
 // Converts the text of json_record back to a record without the file's name. Throws std::exception
 // if the text is not of that form.
 record record_from_json(const std::string &text);
-
-#endif

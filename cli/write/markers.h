@@ -2,8 +2,7 @@
 //
 // Input: a record (run/record.h) and the options. Output: the content of the file, which
 // run/worker_process.h writes. Follows run/analyse.h.
-#ifndef TAVO_CLI_WRITE_MARKERS_H
-#define TAVO_CLI_WRITE_MARKERS_H
+#pragma once
 
 #include <string>
 #include <vector>
@@ -39,5 +38,3 @@ std::string marker_content(const record &result, const options &opts);
 
 // Returns the end of the highlight. Without --length, a highlight is as long as a usual preview.
 double region_end_ms(const record &result);
-
-#endif

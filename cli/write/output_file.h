@@ -1,6 +1,5 @@
 // Output files, written atomically: a target is replaced by a complete file or stays unchanged.
-#ifndef TAVO_CLI_WRITE_OUTPUT_FILE_H
-#define TAVO_CLI_WRITE_OUTPUT_FILE_H
+#pragma once
 
 #include <string>
 
@@ -34,5 +33,3 @@ void abandon_output(output_file &file);
 
 // Writes a whole file with the functions above.
 failure write_file(const std::string &target, const std::string &content, bool force);
-
-#endif

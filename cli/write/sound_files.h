@@ -3,8 +3,7 @@
 //
 // Input: the options, and for a clip a record with a highlight (run/record.h) and its song
 // (input/song_file.h). Output: files. Used by run/analyse.h and run/worker_process.h.
-#ifndef TAVO_CLI_WRITE_SOUND_FILES_H
-#define TAVO_CLI_WRITE_SOUND_FILES_H
+#pragma once
 
 #include <string>
 
@@ -30,5 +29,3 @@ std::string clip_path(const std::string &input, const options &opts);
 // which requests a stop. A failure leaves the target unchanged.
 failure write_clip(const record &result, const options &opts, const std::string &target,
                    int stop_fd, const song_file &song);
-
-#endif

@@ -1,7 +1,6 @@
 // Converts names, which may contain any bytes, and other values to text for people, JSON, XML and
 // URLs.
-#ifndef TAVO_CLI_WRITE_VALUE_TEXT_H
-#define TAVO_CLI_WRITE_VALUE_TEXT_H
+#pragma once
 
 #include <cstdint>
 #include <map>
@@ -58,5 +57,3 @@ std::string file_url(const std::string &path);
 // Returns the name followed by the suffix. If the result is too long for a file system, the name is
 // cut, and a hash of the whole name is put before the suffix.
 std::string fitting_name(const std::string &name, const std::string &suffix);
-
-#endif

@@ -1,6 +1,5 @@
 // Sets up a beat analysis of a given signal and generates test signals.
-#ifndef TAVO_TESTS_BEAT_BEAT_FIXTURE_H
-#define TAVO_TESTS_BEAT_BEAT_FIXTURE_H
+#pragma once
 
 #include <gtest/gtest.h>
 
@@ -68,5 +67,3 @@ inline std::vector<double> extreme_samples(size_t n, int highest, std::mt19937 *
     }
     return samples;
 }
-
-#endif

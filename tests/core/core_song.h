@@ -1,6 +1,5 @@
 // The song for the tests in this folder: 100 s at 120 BPM, loud from 41 s to 80 s.
-#ifndef TAVO_TESTS_CORE_CORE_SONG_H
-#define TAVO_TESTS_CORE_CORE_SONG_H
+#pragma once
 
 #include <gtest/gtest.h>
 
@@ -43,5 +42,3 @@ void for_each_mode(std::initializer_list<int32_t> modes, action test) {
 }
 
 }  // namespace core_song
-
-#endif

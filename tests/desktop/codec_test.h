@@ -1,6 +1,5 @@
 // Helpers for tests that read the encoded files made by tests/support/make_songs.sh.
-#ifndef TAVO_TESTS_DESKTOP_CODEC_TEST_H
-#define TAVO_TESTS_DESKTOP_CODEC_TEST_H
+#pragma once
 
 #include <gtest/gtest.h>
 
@@ -95,5 +94,3 @@ inline mtsrc_io io_for(const std::string &path) {
 }
 
 }  // namespace codec_test
-
-#endif

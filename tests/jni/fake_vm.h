@@ -1,7 +1,6 @@
 // A fake Java virtual machine with one class and one method. It counts the references that it
 // returns, and a test can make one of its functions fail. Only one file may include this header.
-#ifndef TAVO_TESTS_JNI_FAKE_VM_H
-#define TAVO_TESTS_JNI_FAKE_VM_H
+#pragma once
 
 #include <jni.h>
 
@@ -158,5 +157,3 @@ extern "C" __attribute__((visibility("default"), format(printf, 3, 4))) int __an
     fake_vm::machine_state.log_lines += std::to_string(prio) + ": " + text + "\n";
     return 1;
 }
-
-#endif

@@ -1,7 +1,6 @@
 // Defines a file in each format, and a fixture that opens and reads such files. The fake codec
 // library determines what the decoders deliver.
-#ifndef TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
-#define TAVO_TESTS_MEDIA_SOURCE_SOURCE_CASE_H
+#pragma once
 
 #include <gtest/gtest.h>
 
@@ -113,5 +112,3 @@ struct SourceTest : testing::Test {
         src = nullptr;
     }
 };
-
-#endif

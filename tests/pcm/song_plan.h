@@ -1,7 +1,6 @@
 // A fixture with an instance that is ready to decode. The fake codec library describes the stream,
 // and each test supplies the stream's bytes.
-#ifndef TAVO_TESTS_PCM_SONG_PLAN_H
-#define TAVO_TESTS_PCM_SONG_PLAN_H
+#pragma once
 
 #include <gtest/gtest.h>
 
@@ -121,5 +120,3 @@ class song_plan : public testing::Test {
     fake_source sources[4];
     TAVO_CTX ctx = {};
 };
-
-#endif

@@ -1,6 +1,5 @@
 // Helpers that make byte strings and files for tests.
-#ifndef TAVO_TESTS_SUPPORT_BYTES_H
-#define TAVO_TESTS_SUPPORT_BYTES_H
+#pragma once
 
 #include <unistd.h>
 
@@ -47,5 +46,3 @@ struct temporary_file {
 };
 
 }  // namespace support
-
-#endif

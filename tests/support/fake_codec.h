@@ -4,8 +4,7 @@
 // A stream_spec describes a file by its properties and its frames. Each reader of the file starts
 // at the first frame. Any thread may call the library, but a test may read the library's state only
 // while no other thread uses it.
-#ifndef TAVO_TESTS_SUPPORT_FAKE_CODEC_H
-#define TAVO_TESTS_SUPPORT_FAKE_CODEC_H
+#pragma once
 
 #include <cstdint>
 #include <deque>
@@ -103,5 +102,3 @@ std::string call_names();                             // each followed by a spac
 bool tags_are_empty();  // true if the buffers of all returned tags were freed
 
 }  // namespace fake_codec
-
-#endif

@@ -1,7 +1,6 @@
 // Makes calls to memory, thread, lock and file functions fail, on any thread. The program must link
 // the library's objects, because the linker cannot replace the calls in libtavo.so.
-#ifndef TAVO_TESTS_SUPPORT_FAULT_LAYER_H
-#define TAVO_TESTS_SUPPORT_FAULT_LAYER_H
+#pragma once
 
 #include <cerrno>
 #include <cstdint>
@@ -44,5 +43,3 @@ int64_t counted_calls();  // counted calls since arm
 int64_t failed_calls();   // failed calls since arm
 
 }  // namespace fault
-
-#endif

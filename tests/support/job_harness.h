@@ -1,6 +1,5 @@
 // Runs jobs in tests with a callback that counts its calls and copies the result.
-#ifndef TAVO_TESTS_SUPPORT_JOB_HARNESS_H
-#define TAVO_TESTS_SUPPORT_JOB_HARNESS_H
+#pragma once
 
 #include <unistd.h>
 
@@ -85,5 +84,3 @@ inline TAVO_CTX *create(const std::string &path, int32_t mode, int32_t *err = nu
 }
 
 }  // namespace job
-
-#endif

@@ -1,7 +1,6 @@
 // Makes synthetic songs whose loud section, tempo and drum hits are known, and WAV files of them.
 // The same plan always gives the same samples.
-#ifndef TAVO_TESTS_SUPPORT_SONG_H
-#define TAVO_TESTS_SUPPORT_SONG_H
+#pragma once
 
 #include <cstdint>
 #include <string>
@@ -38,5 +37,3 @@ std::string wav_bytes(const std::vector<int16_t> &pcm, int32_t rate, int32_t cha
 bool write_wav(const std::string &path, const song &source);
 
 }  // namespace support
-
-#endif

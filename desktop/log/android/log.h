@@ -2,8 +2,7 @@
  * standard error. By default it writes only errors (priority 6 and above); set the environment
  * variable TAVO_LOG to "verbose" or "debug" for more. On Android the platform's own header and
  * library are used instead. */
-#ifndef TAVO_DESKTOP_LOG_ANDROID_LOG_H
-#define TAVO_DESKTOP_LOG_ANDROID_LOG_H
+#pragma once
 
 #ifdef __cplusplus
 extern "C" {
@@ -24,6 +23,4 @@ __attribute__((format(printf, 3, 4))) int __android_log_print(int prio, const ch
 
 #ifdef __cplusplus
 }
-#endif
-
 #endif

@@ -4,8 +4,7 @@
 //
 // Input: the fields of an ADTS header or the configuration of an MP4 track; the offset of each raw
 // block. Output: a stream_info. Precedes shared/stream.h.
-#ifndef WEXAAUDIO_AAC_STREAM_H
-#define WEXAAUDIO_AAC_STREAM_H
+#pragma once
 
 #include "desktop/wexaaudio/shared/stream.h"
 
@@ -42,5 +41,3 @@ bool aac_config_read(aac_config *config, const void *data, int32_t bytes);
 // chooses the groups. A frame of impossible size becomes silence. Returns false if no frame can be
 // decoded or memory runs out.
 bool aac_stream_complete(io_file *file, aac_config *config, stream_info *info);
-
-#endif

@@ -3,8 +3,7 @@
 // and of its fragments. Edit lists are ignored.
 //
 // Input: the file. Output: the codec and the frames, without sample counts. Precedes mp4_demux.cpp.
-#ifndef WEXAAUDIO_MP4_BOXES_H
-#define WEXAAUDIO_MP4_BOXES_H
+#pragma once
 
 #include "desktop/wexaaudio/aac/aac_stream.h"
 #include "desktop/wexaaudio/shared/stream.h"
@@ -18,5 +17,3 @@ struct mp4_codec {
 // Stops adding frames at the first one past the end of the file. Returns false if the file has no
 // movie box or cannot be read, or if memory runs out.
 bool mp4_read_boxes(io_file *file, stream_info *info, mp4_codec *codec);
-
-#endif

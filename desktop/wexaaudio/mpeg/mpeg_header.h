@@ -1,7 +1,6 @@
 // Parses the four-byte headers of MPEG audio frames (ISO/IEC 11172-3, 13818-3 and the 2.5
 // extension) and the parts of a frame's body that the readers need.
-#ifndef WEXAAUDIO_MPEG_HEADER_H
-#define WEXAAUDIO_MPEG_HEADER_H
+#pragma once
 
 #include <cstdint>
 
@@ -33,5 +32,3 @@ bool mpeg_is_info_frame(const mpeg_header *h, const uint8_t *p, int32_t bytes);
 
 // Sets the fields of `info` that determine how frames like `head` are decoded.
 void mpeg_describe(const mpeg_header *head, stream_info *info);
-
-#endif

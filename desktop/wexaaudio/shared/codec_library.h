@@ -1,8 +1,7 @@
 // A table of the functions that call libavcodec. libavcodec loads a hundred shared objects, so
 // these functions are in a shared object of their own, libwexaaudio_av.so, next to libwexaaudio.so.
 // It is loaded when an AAC, MPEG audio, MP4 or Ogg file is first opened.
-#ifndef WEXAAUDIO_CODEC_LIBRARY_H
-#define WEXAAUDIO_CODEC_LIBRARY_H
+#pragma once
 
 #include <cstdint>
 
@@ -50,5 +49,3 @@ extern "C" const codec_library wexaaudio_av;
 // Returns the table; the first call loads it. Returns null if it cannot be loaded, and logs the
 // reason. May be called on any thread.
 const codec_library *codec_library_get(void);
-
-#endif

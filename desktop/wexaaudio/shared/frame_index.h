@@ -1,7 +1,6 @@
 // Index of a stream's compressed frames: where each is in the file and in the decoded stream. It is
 // built when a file is opened. Durations and seek positions come from it and are never estimated.
-#ifndef WEXAAUDIO_FRAME_INDEX_H
-#define WEXAAUDIO_FRAME_INDEX_H
+#pragma once
 
 #include <cstdint>
 
@@ -28,5 +27,3 @@ int64_t frame_index_find(const frame_index *index, int64_t sample);
 
 // Returns the end of the last frame in sample frames, or 0 if the index is empty.
 int64_t frame_index_end(const frame_index *index);
-
-#endif

@@ -1,6 +1,5 @@
 // Detects ID3v2 tags, which may come before any bare stream and, in MPEG audio, inside it.
-#ifndef WEXAAUDIO_ID3V2_H
-#define WEXAAUDIO_ID3V2_H
+#pragma once
 
 #include <cstdint>
 #include <cstring>
@@ -16,5 +15,3 @@ inline int64_t id3v2_bytes(const uint8_t *p) {
     const bool footer = (p[5] & 0x10) != 0;
     return kId3v2Head + size + (footer ? kId3v2Head : 0);
 }
-
-#endif

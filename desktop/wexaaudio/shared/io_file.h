@@ -2,8 +2,7 @@
 // reads at any offset through one buffer. Offsets and sizes are 64-bit.
 //
 // Input: mtsrc_io. Output: bytes at an offset. A file is used by one thread at a time.
-#ifndef WEXAAUDIO_IO_FILE_H
-#define WEXAAUDIO_IO_FILE_H
+#pragma once
 
 #include "media_source/mtsrc_io.h"
 
@@ -38,5 +37,3 @@ const uint8_t *io_file_peek(io_file *f, int64_t offset, int32_t want, int32_t *g
 
 // Returns `count` bytes at `offset` as io_file_peek does, or null if the file has fewer.
 const uint8_t *io_file_bytes(io_file *f, int64_t offset, int32_t count);
-
-#endif

@@ -4,8 +4,7 @@
 // was replaced or written to is scanned again. The last result is kept for the next reader, unless
 // the file changed so recently that another change could go unnoticed. Readers whose callbacks do
 // not read the file at the path share nothing.
-#ifndef WEXAAUDIO_SCAN_CACHE_H
-#define WEXAAUDIO_SCAN_CACHE_H
+#pragma once
 
 #include "desktop/wexaaudio/shared/frame_index.h"
 #include "desktop/wexaaudio/shared/io_file.h"
@@ -57,5 +56,3 @@ typedef bool (*scan_function)(io_file *file, stream_info *info);
 const stream_info *scan_cache_get(io_file *file, scan_function scan);
 
 void scan_cache_put(const stream_info *info);  // null is allowed
-
-#endif

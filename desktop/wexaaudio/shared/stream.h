@@ -3,8 +3,7 @@
 // from them, seek in them and delete them.
 //
 // Input: the frames that a format's scan found. Output: PCM. Precedes copy_decoder.cpp.
-#ifndef WEXAAUDIO_STREAM_H
-#define WEXAAUDIO_STREAM_H
+#pragma once
 
 #include "desktop/wexaaudio/shared/codec_library.h"
 #include "desktop/wexaaudio/shared/scan_cache.h"
@@ -26,5 +25,3 @@ stream_reader *stream_open(const mtsrc_io *io, scan_function scan, int64_t *dura
 // bytes copied, which is smaller if the pages or the file end first, or -1 on a read error.
 int64_t stream_copy(io_file *file, const stream_info *info, int64_t offset, uint8_t *buf,
                     int64_t bytes);
-
-#endif

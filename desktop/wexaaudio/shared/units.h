@@ -1,7 +1,6 @@
 // Converts between samples and 100-ns units. A time computed from a sample count converts back to
 // the same count, whether the result is rounded down or to nearest. Reported positions are exact.
-#ifndef WEXAAUDIO_UNITS_H
-#define WEXAAUDIO_UNITS_H
+#pragma once
 
 #include <cstdint>
 
@@ -18,5 +17,3 @@ int64_t seek_target(int64_t units, int64_t end, int32_t rate);
 // Returns the duration of a stream in 100-ns units, rounded up to a multiple of four so that a
 // quarter of the duration contains a quarter of the samples.
 int64_t units_of_duration(int64_t samples, int32_t rate);
-
-#endif
