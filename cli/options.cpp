@@ -9,7 +9,6 @@
 #include <utility>
 
 #include "cli/input/ffmpeg.h"
-#include "cli/input/shard.h"
 #include "cli/write/format.h"
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"

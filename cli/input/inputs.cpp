@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <strings.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -19,6 +18,7 @@
 #include "cli/input/song_file.h"
 #include "cli/system.h"
 #include "cli/write/markers.h"
+#include "cli/write/output_file.h"
 #include "cli/write/sound_files.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
@@ -42,28 +42,20 @@ void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
 }
 
-file_id id_of(const struct stat &info) {
-    return {info.st_dev, info.st_ino};
-}
-
 // Claims the marker file or clip of an input, so that no other input writes the same file. Returns
 // false if the input must be skipped.
 bool claim_target(input_supply &supply, input &entry, const std::string &target) {
-    struct stat file {};
-    struct stat folder {};
-    if (supply.opts.skip_existing && lstat(target.c_str(), &file) == 0) {
+    std::error_code failed;
+    if (supply.opts.skip_existing && fs::exists(fs::symlink_status(target, failed))) {
         ++supply.existing;
         return false;
     }
-    const std::string name = base_name(target);
-    const std::string folder_path = target.substr(0, target.size() - name.size()) + ".";
-    if (stat(folder_path.c_str(), &folder) != 0 || stat(entry.path.c_str(), &file) != 0) {
-        return true;  // a failure is reported when the file is read or written
-    }
-    const auto [claim, is_first] =
-        supply.targets.emplace(std::pair(id_of(folder), name), id_of(file));
+    const fs::path place = fs::weakly_canonical(fs::absolute(target), failed);
+    // A failure is reported when the file is read or written.
+    if (failed || !fs::exists(entry.path, failed)) return true;
+    const auto [claim, is_first] = supply.targets.emplace(place, entry.path);
     if (is_first) return true;
-    if (claim->second == id_of(file)) {
+    if (same_file(claim->second, entry.path)) {
         add_note(supply, shown(entry.path) + ": named more than once, done once.");
         return false;
     }
@@ -81,9 +73,9 @@ bool claim_targets(input_supply &supply, input &entry) {
 
 // Adds the entries of a folder, unless this search has already entered it through another link.
 failure enter_folder(input_supply &supply, const std::string &path) {
-    struct stat info {};
-    if (stat(path.c_str(), &info) == 0 && !supply.searched.insert(id_of(info)).second) return {};
     std::error_code code;
+    const fs::path folder = fs::canonical(path, code);
+    if (!code && !supply.searched.insert(folder).second) return {};
     std::vector<std::string> entries;
     fs::directory_iterator entry(path, code);
     for (; !code && entry != fs::directory_iterator(); entry.increment(code)) {
@@ -137,10 +129,9 @@ failure cannot_read_list(int code) {
 
 // Refuses NUL bytes without -0, and a song passed by mistake, which would yield thousands of names.
 failure check_start(const std::string &text, char separator) {
-    const file_kind kind = recognise_bytes(text);
-    if (kind != file_kind::unknown) {
-        return {std::string("This is sound (") + kind_name(kind) +
-                "), not a list of names; name it as FILE, which is /dev/stdin for a pipe."};
+    if (recognise_bytes(text) != file_kind::unknown) {
+        return {
+            "This is sound, not a list of names; name it as FILE, which is /dev/stdin for a pipe."};
     }
     if (separator != '\0' && text.find('\0') != std::string::npos) {
         return {"The list holds NUL bytes: give -0 when its names end with them."};

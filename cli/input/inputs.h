@@ -3,12 +3,9 @@
 // Input: the files, folders and lists in the options. Output: one input per file. Used by main.cpp.
 #pragma once
 
-#include <sys/types.h>
-
 #include <map>
 #include <set>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "cli/failure.h"
@@ -34,21 +31,18 @@ struct name_list {
     bool ended = false;     // the end of the list has been read
 };
 
-using file_id = std::pair<dev_t, ino_t>;
-
 struct input_supply {
     const options &opts;
     size_t argument = 0;                    // next index in opts.inputs, then in opts.lists
     name_list list = {};                    // list that is being read
     std::string folder = {};                // folder that is being searched, or empty
     std::vector<std::string> entries = {};  // entries of the folder not yet examined, last first
-    std::set<file_id> searched = {};        // the folder and its searched subfolders
+    std::set<std::string> searched = {};    // the folder and its searched subfolders
     size_t found = 0;                       // audio files found in the folder
     size_t skipped = 0;                     // other files found in the folder
     size_t existing = 0;                    // inputs left out by --skip-existing
-    // The folder and the name of each marker file or clip, and its input.
-    std::map<std::pair<file_id, std::string>, file_id> targets = {};
-    std::string notes = {};  // lines for standard error
+    std::map<std::string, std::string> targets = {};  // marker files and clips, and their inputs
+    std::string notes = {};                           // lines for standard error
 };
 
 enum class supply_state {

@@ -120,10 +120,6 @@ int recognise(const std::string &path, file_kind &kind) {
     return code;
 }
 
-const char *kind_name(file_kind kind) {
-    return kKinds[static_cast<size_t>(kind)].name;
-}
-
 std::string read_bytes(const std::string &path, int64_t offset, int64_t size, int &code) {
     std::string bytes;
     int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);

@@ -23,9 +23,6 @@ file_kind recognise_bytes(std::string_view head);
 // unknown kind. Never blocks.
 int recognise(const std::string &path, file_kind &kind);
 
-// Returns the format's name for messages.
-const char *kind_name(file_kind kind);
-
 // Returns up to `size` bytes of a regular file, starting at `offset`: fewer at the end of the file
 // or after an error. `code` receives the errno of the error, or 0. Any other kind of file counts as
 // empty. Never blocks.

@@ -10,7 +10,6 @@
 #include <array>
 #include <cerrno>
 #include <cstdio>
-#include <string_view>
 
 #include "cli/input/ffmpeg.h"
 #include "cli/input/recognise.h"

@@ -2,7 +2,7 @@
 // output of ffmpeg.
 //
 // Input: a path that the user named. Output: a path for the library. Used by inputs.h,
-// run/analyse.h, run/worker_process.h and write/sound_files.h.
+// run/analyse.h, run/reply.h and write/sound_files.h.
 #pragma once
 
 #include <string>

@@ -1,7 +1,7 @@
 // The page that plays a song and shows its result, and the index of several such pages: --report.
 //
 // Input: a record (run/record.h) and its view (song_view.h). Output: HTML files that work offline.
-// Follows run/analyse.h. run/worker_process.h writes the pages, run/ordered_output.h the index.
+// Follows run/analyse.h. run/reply.h writes the pages, run/ordered_output.h the index.
 #pragma once
 
 #include <cstdint>

@@ -41,10 +41,10 @@ std::string progress_text(const ordered_output &output, double seconds) {
     const double per_second = static_cast<double>(output.done) / seconds;
     const std::string speed = formatted(", %.1f a minute", per_second * 60.0);
     if (output.total == 0) return count_text(output.done, "file") + speed;
+    const std::string text = formatted(" %zu/%zu files", output.done, output.total) + speed;
+    if (output.done == 0) return text;
     const double left_ms = 1000.0 * static_cast<double>(output.total - output.done) / per_second;
-    return " " + std::to_string(output.done) + "/" + std::to_string(output.total) + " files" +
-           speed +
-           (output.done == 0 ? ", time unknown" : ", " + whole_clock_text(left_ms) + " left");
+    return text + ", " + whole_clock_text(left_ms) + " left";
 }
 
 }  // namespace

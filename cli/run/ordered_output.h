@@ -13,7 +13,7 @@
 #include "cli/failure.h"
 #include "cli/options.h"
 #include "cli/report/report.h"
-#include "cli/run/worker_process.h"
+#include "cli/run/reply.h"
 
 struct ordered_output {
     std::map<size_t, reply> waiting;  // replies waiting for those of earlier inputs

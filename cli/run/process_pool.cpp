@@ -1,5 +1,7 @@
 #include "cli/run/process_pool.h"
 
+#include <malloc.h>
+#include <sys/mman.h>
 #include <sys/prctl.h>
 #include <sys/socket.h>
 #include <sys/time.h>
@@ -9,8 +11,14 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
+#include <exception>
+#include <nlohmann/json.hpp>
 
 #include "cli/write/value_text.h"
+
+// The fields that cross the socket.
+NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(input, index, path, stored)
+NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(reply, status, result, message, json, row)
 
 namespace {
 
@@ -18,6 +26,65 @@ using std::chrono::steady_clock;
 
 constexpr std::chrono::milliseconds kStopPatience{900};
 constexpr timeval kReplyPatience = {10, 0};  // from the start of a reply to its end
+
+// The sizes are in bytes.
+constexpr int kHeapAtStart = 12 << 20;       // the buffers of a short song
+constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappings
+constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
+constexpr int kFreeMemoryKept = 64 << 20;
+
+// An end of the connection that has closed is noticed when the next message is received.
+void send_message(int fd, const nlohmann::json &message) {
+    std::string bytes;
+    nlohmann::json::to_cbor(message, bytes);
+    const size_t size = bytes.size();
+    write_all(fd, {reinterpret_cast<const char *>(&size), sizeof size});
+    write_all(fd, bytes);
+}
+
+// Waits for a whole message. Returns false if the other end has closed, the socket's time limit has
+// passed or a signal interrupts the wait.
+template <typename record_type>
+bool receive_message(int fd, record_type &message) {
+    size_t size = 0;
+    if (recv(fd, &size, sizeof size, MSG_WAITALL) != sizeof size) return false;
+    std::string bytes(size, '\0');
+    if (recv(fd, bytes.data(), size, MSG_WAITALL) != static_cast<ssize_t>(size)) return false;
+    nlohmann::json::from_cbor(bytes).get_to(message);
+    return true;
+}
+
+// ---- In a worker.
+
+// Each job reuses the heap of the previous one instead of asking the system for new pages. The heap
+// starts large enough for a song, in huge pages: each takes one page fault instead of 512.
+void prepare_heap() {
+    mallopt(M_TRIM_THRESHOLD, kFreeMemoryKept);
+    mallopt(M_MMAP_THRESHOLD, kLargestThreshold);  // so that the block below is part of the heap
+    const auto page = static_cast<size_t>(sysconf(_SC_PAGESIZE));
+    void *block = nullptr;
+    if (posix_memalign(&block, page, kHeapAtStart) == 0) {
+        madvise(block, kHeapAtStart, MADV_HUGEPAGE);
+        free(block);
+    }
+    mallopt(M_MMAP_THRESHOLD, kLargestHeapBlock);
+}
+
+// Serves inputs until the other end of the socket is closed.
+void serve_inputs(int fd, const options &opts) {
+    prepare_heap();
+    for (input next; receive_message(fd, next);) {
+        reply answer;
+        try {
+            answer = serve(next, opts, fd);
+        } catch (const std::exception &) {  // only allocations can fail here
+            const char *error = "There is not enough memory for the result.";
+            answer = make_reply({next.path, opts.mode, outcome::failed, error}, opts);
+            answer.json.clear();
+        }
+        send_message(fd, answer);
+    }
+}
 
 // Runs in the new process. Closes its copies of the other workers' sockets, because otherwise those
 // workers would not notice the end of the command.
@@ -29,6 +96,8 @@ constexpr timeval kReplyPatience = {10, 0};  // from the start of a reply to its
     serve_inputs(fd, pool.opts);
     exit(kExitOk);
 }
+
+// ---- In the command.
 
 failure start_worker(process_pool &pool, worker_process &worker) {
     int ends[2] = {-1, -1};
@@ -91,7 +160,7 @@ void reap(process_pool &pool, worker_process &worker) {
 
 void read_from(process_pool &pool, worker_process &worker) {
     reply answer;
-    if (receive_reply(worker.fd, answer)) {
+    if (receive_message(worker.fd, answer)) {
         finish_input(pool, worker, std::move(answer));
     } else {
         reap(pool, worker);
@@ -101,15 +170,12 @@ void read_from(process_pool &pool, worker_process &worker) {
 }  // namespace
 
 bool assign(process_pool &pool, input &next) {
-    const auto is_idle = [](const worker_process &worker) { return !worker.current; };
-    const auto is_waiting = [](const worker_process &worker) {
-        return worker.pid > 0 && !worker.current;
-    };
-    auto worker = std::find_if(pool.workers.begin(), pool.workers.end(), is_waiting);
-    if (worker == pool.workers.end()) {
-        worker = std::find_if(pool.workers.begin(), pool.workers.end(), is_idle);
-    }
-    if (worker == pool.workers.end()) return false;
+    // An idle worker that is running comes before one that must be started.
+    const auto rank = [](const worker_process &each) { return each.current ? 2 : each.pid < 0; };
+    const auto worker =
+        std::min_element(pool.workers.begin(), pool.workers.end(),
+                         [&](const auto &a, const auto &b) { return rank(a) < rank(b); });
+    if (worker->current) return false;
     if (worker->pid < 0 && !next.refusal) {
         const failure not_started = start_worker(pool, *worker);
         if (not_started && pool.running > 0) return false;
@@ -120,7 +186,7 @@ bool assign(process_pool &pool, input &next) {
         pool.on_reply(std::move(next), make_reply(result, pool.opts));
         return true;
     }
-    send_input(worker->fd, next);
+    send_message(worker->fd, next);
     worker->current = std::move(next);
     if (pool.opts.timeout_s > 0) {
         worker->deadline = steady_clock::now() + std::chrono::seconds(pool.opts.timeout_s);

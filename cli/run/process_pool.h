@@ -3,7 +3,8 @@
 //
 // The command and a worker are connected by a socket pair. When the command closes its end for
 // writing, the worker stops its analysis and ends. When a worker ends, the command reads
-// end-of-file from it. The command is single-threaded, so that it can fork at any moment.
+// end-of-file from it. Each message is a CBOR object, preceded by its size. Its strings may contain
+// any bytes. The command is single-threaded, so that it can fork at any moment.
 #pragma once
 
 #include <poll.h>
@@ -18,7 +19,7 @@
 #include "cli/failure.h"
 #include "cli/input/inputs.h"
 #include "cli/options.h"
-#include "cli/run/worker_process.h"
+#include "cli/run/reply.h"
 #include "cli/system.h"
 
 using time_point = std::chrono::steady_clock::time_point;

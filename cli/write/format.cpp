@@ -6,7 +6,6 @@
 #include <cmath>
 #include <nlohmann/json.hpp>
 #include <utility>
-#include <vector>
 
 #include "cli/write/markers.h"
 #include "cli/write/value_text.h"

@@ -1,7 +1,7 @@
 // Marker files for editors, one beside each song or in --output-dir.
 //
 // Input: a record (run/record.h) and the options. Output: the content of the file, which
-// run/worker_process.h writes. Follows run/analyse.h.
+// run/reply.h writes. Follows run/analyse.h.
 #pragma once
 
 #include <string>

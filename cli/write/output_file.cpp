@@ -88,8 +88,7 @@ failure commit_output(output_file &file, bool force) {
 }
 
 void abandon_output(output_file &file) {
-    if (file.fd >= 0) close(file.fd);
-    file.fd = -1;
+    close_fd(file.fd);
     if (!file.temporary.empty()) {
         unlink(file.temporary.c_str());
         note_temporary_file("");

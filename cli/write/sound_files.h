@@ -2,7 +2,7 @@
 // (--clip), which the ffmpeg program cuts out of the song.
 //
 // Input: the options, and for a clip a record with a highlight (run/record.h) and its song
-// (input/song_file.h). Output: files. Used by run/analyse.h and run/worker_process.h.
+// (input/song_file.h). Output: files. Used by run/analyse.h and run/reply.h.
 #pragma once
 
 #include <string>

@@ -1,16 +1,13 @@
 #include "cli/write/value_text.h"
 
-#include <algorithm>
 #include <cctype>
 #include <climits>
 #include <cmath>
 #include <cstdarg>
-#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
-#include <iterator>
 #include <memory>
 #include <new>
 #include <string_view>

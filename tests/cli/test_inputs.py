@@ -85,7 +85,7 @@ class Inputs(Case):
                 ("-", b"\xef\xbb\xbf#EXTM3U\r\n#EXTINF:60,Song\r\nmusic/a.wav\r\n\r\n#1.wav\r\n", [a, b"#1.wav"])):
             self.assertEqual(self.found(*words.split(), input=text), expected, text)
         for words, text, message in (  # these are not lists
-                ("-", sound, b"sound (WAV), not a list"), ("-0 -", sound, b"sound (WAV)"),
+                ("-", sound, b"This is sound, not a list"), ("-0 -", sound, b"This is sound"),
                 ("--files-from music/a.wav", b"", b"name it as FILE"),
                 ("--files-from nowhere", b"", b"list of files cannot be read"),
                 ("-", b"music/a.wav\0music/b.txt", b"give -0"), ("-", b"x" * 70000, b"more than 4096 bytes")):

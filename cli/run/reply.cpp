@@ -1,54 +1,18 @@
-#include "cli/run/worker_process.h"
-
-#include <malloc.h>
-#include <sys/mman.h>
-#include <sys/socket.h>
-#include <unistd.h>
+#include "cli/run/reply.h"
 
 #include <cstdint>
-#include <cstdlib>
 #include <exception>
-#include <nlohmann/json.hpp>
 
 #include "cli/input/recognise.h"
 #include "cli/report/report.h"
 #include "cli/run/analyse.h"
-#include "cli/system.h"
 #include "cli/write/format.h"
 #include "cli/write/markers.h"
 #include "cli/write/output_file.h"
 #include "cli/write/sound_files.h"
 #include "cli/write/value_text.h"
 
-NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(input, index, path, stored)
-NLOHMANN_DEFINE_TYPE_NON_INTRUSIVE(reply, status, result, message, json, row)
-
 namespace {
-
-// The sizes are in bytes.
-constexpr int kHeapAtStart = 12 << 20;       // the buffers of a short song
-constexpr int kLargestHeapBlock = 4 << 20;   // larger blocks get separate mappings
-constexpr int kLargestThreshold = 32 << 20;  // largest value that malloc accepts
-constexpr int kFreeMemoryKept = 64 << 20;
-
-void send_message(int fd, const nlohmann::json &message) {
-    std::string bytes;
-    nlohmann::json::to_cbor(message, bytes);
-    const size_t size = bytes.size();
-    write_all(fd, {reinterpret_cast<const char *>(&size), sizeof size});
-    write_all(fd, bytes);
-}
-
-// Returns false at the end of the connection.
-template <typename record_type>
-bool receive_message(int fd, record_type &message) {
-    size_t size = 0;
-    if (recv(fd, &size, sizeof size, MSG_WAITALL) != sizeof size) return false;
-    std::string bytes(size, '\0');
-    if (recv(fd, bytes.data(), size, MSG_WAITALL) != static_cast<ssize_t>(size)) return false;
-    nlohmann::json::from_cbor(bytes).get_to(message);
-    return true;
-}
 
 // Returns a result from the store. Opens the song if its page is requested.
 record read_stored(const input &next, const options &opts, int stop_fd, song_file &song) {
@@ -113,43 +77,6 @@ failure write_side_files(record &result, const options &opts, uint64_t index, in
     return failed;
 }
 
-// Analyses an input and writes its files. A failure to write one is not the song's fault, so the
-// store does not record it.
-reply serve(const input &next, const options &opts, int stop_fd) {
-    song_file song;
-    std::string row;
-    record result;
-    failure failed = check_side_files(next, opts);
-    if (!failed) {
-        result = next.stored.empty() ? analyse(next.path, opts, stop_fd, song)
-                                     : read_stored(next, opts, stop_fd, song);
-        result.length_s = opts.length_s;
-        if (result.status == outcome::ok) {
-            failed = write_side_files(result, opts, next.index, stop_fd, song, row);
-        }
-    }
-    close_song(song);
-    if (failed) result = {next.path, opts.mode, outcome::failed, failed.sentence};
-    reply answer = make_reply(result, opts);
-    if (failed) answer.json.clear();
-    if (result.status == outcome::ok) answer.row = row;
-    return answer;
-}
-
-// Each job reuses the heap of the previous one instead of asking the system for new pages. The heap
-// starts large enough for a song, in huge pages: each takes one page fault instead of 512.
-void prepare_heap() {
-    mallopt(M_TRIM_THRESHOLD, kFreeMemoryKept);
-    mallopt(M_MMAP_THRESHOLD, kLargestThreshold);  // so that the block below is part of the heap
-    const auto page = static_cast<size_t>(sysconf(_SC_PAGESIZE));
-    void *block = nullptr;
-    if (posix_memalign(&block, page, kHeapAtStart) == 0) {
-        madvise(block, kHeapAtStart, MADV_HUGEPAGE);
-        free(block);
-    }
-    mallopt(M_MMAP_THRESHOLD, kLargestHeapBlock);
-}
-
 }  // namespace
 
 reply make_reply(const record &result, const options &opts) {
@@ -168,25 +95,23 @@ reply make_reply(const record &result, const options &opts) {
     return out;
 }
 
-void send_input(int fd, const input &next) {
-    send_message(fd, next);
-}
-
-bool receive_reply(int fd, reply &answer) {
-    return receive_message(fd, answer);
-}
-
-void serve_inputs(int fd, const options &opts) {
-    prepare_heap();
-    for (input next; receive_message(fd, next);) {
-        reply answer;
-        try {
-            answer = serve(next, opts, fd);
-        } catch (const std::exception &) {  // only allocations can fail here
-            const char *error = "There is not enough memory for the result.";
-            answer = make_reply({next.path, opts.mode, outcome::failed, error}, opts);
-            answer.json.clear();
+reply serve(const input &next, const options &opts, int stop_fd) {
+    song_file song;
+    std::string index_row;
+    record result;
+    failure failed = check_side_files(next, opts);
+    if (!failed) {
+        result = next.stored.empty() ? analyse(next.path, opts, stop_fd, song)
+                                     : read_stored(next, opts, stop_fd, song);
+        result.length_s = opts.length_s;
+        if (result.status == outcome::ok) {
+            failed = write_side_files(result, opts, next.index, stop_fd, song, index_row);
         }
-        send_message(fd, answer);
     }
+    close_song(song);
+    if (failed) result = {next.path, opts.mode, outcome::failed, failed.sentence};
+    reply answer = make_reply(result, opts);
+    if (failed) answer.json.clear();  // not the song's fault, so the store does not record it
+    if (result.status == outcome::ok) answer.row = index_row;
+    return answer;
 }
