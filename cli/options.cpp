@@ -71,14 +71,14 @@ const std::vector<std::string> kFormats = {"text", "json", "csv"};
 
 std::vector<std::string> format_words() {
     std::vector<std::string> words = kFormats;
-    for (const marker_format &entry : marker_formats()) words.emplace_back(entry.word);
+    for (const auto &entry : kMarkerFormats) words.push_back(entry.first);
     return words;
 }
 
 void set_format(const std::string &word, options &out) {
     const auto entry = std::find(kFormats.begin(), kFormats.end(), word);
     out.format = static_cast<result_format>(entry - kFormats.begin());
-    out.markers = find_marker_format(word);
+    if (out.format == result_format::markers) out.markers = &kMarkerFormats.at(word);
 }
 
 // Wraps the text at spaces.
@@ -178,7 +178,7 @@ void declare_output(CLI::App &app, options &out) {
     add_text(app, "--fps", out.fps, "RATE",
              "Frames per second for edl, fcpxml and otio: 23.976, 24, 25, 29.97, 29.97df "
              "(drop-frame), 30 (default), 50, 59.94, 59.94df, 60")
-        ->check(CLI::IsMember(frame_rate_names()).description(""));
+        ->check(CLI::IsMember(kFrameRates).description(""));
     app.add_flag("--force", out.force,
                  "Overwrite existing marker files, click tracks, clips and pages");
     app.add_flag("--skip-existing", out.skip_existing, "Skip inputs whose marker file exists");

@@ -79,11 +79,13 @@ extern "C" char *web_analyse(const char *path, int32_t mode, int32_t length_s, i
 // Returns a marker file's content for a result of web_analyse, or null for an unknown format.
 extern "C" char *web_markers(const char *result, int32_t length_s, const char *format,
                              const char *fps) {
+    const auto found = kMarkerFormats.find(format);
+    if (found == kMarkerFormats.end()) return nullptr;
     record song = record_from_json(result);
     song.file = result_json::parse(result).value("file", "");
     song.length_s = length_s;
     options opts;
     opts.fps = fps;
-    opts.markers = find_marker_format(format);
-    return opts.markers == nullptr ? nullptr : strdup(marker_content(song, opts).c_str());
+    opts.markers = &found->second;
+    return strdup(marker_content(song, opts).c_str());
 }

@@ -4,19 +4,9 @@
 #include <cinttypes>
 #include <cmath>
 #include <filesystem>
-#include <iterator>
 #include <nlohmann/json.hpp>
 
 #include "cli/write/value_text.h"
-
-// A video frame rate and its timecode format.
-struct frame_rate {
-    const char *name;  // as in --fps
-    int32_t frames;    // the rate is frames / seconds
-    int32_t seconds;
-    int32_t base;  // frame numbers per second of timecode
-    bool drop;     // the timecode skips frame numbers to match the clock
-};
 
 namespace {
 
@@ -24,13 +14,6 @@ using json = nlohmann::ordered_json;
 
 constexpr int32_t kUsualLengthSeconds = 30;  // of a preview, if --length is not given
 
-constexpr frame_rate kRates[] = {
-    {"23.976", 24000, 1001, 24, false}, {"24", 24, 1, 24, false},
-    {"25", 25, 1, 25, false},           {"29.97", 30000, 1001, 30, false},
-    {"29.97df", 30000, 1001, 30, true}, {"30", 30, 1, 30, false},
-    {"50", 50, 1, 50, false},           {"59.94", 60000, 1001, 60, false},
-    {"59.94df", 60000, 1001, 60, true}, {"60", 60, 1, 60, false},
-};
 constexpr int64_t kStartMinutes = 60;  // timecode of frame 0, the usual start in editors
 
 // The highlight from its start to its end, or a beat, whose start and end are equal. Times are
@@ -265,33 +248,25 @@ std::string otio_timeline(const record &result, const frame_rate &rate) {
 
 }  // namespace
 
-const std::vector<marker_format> &marker_formats() {
-    static const std::vector<marker_format> formats = {
-        {"labels", ".labels.txt", false, false, audacity_labels},
-        {"kdenlive", ".guides.txt", false, false, kdenlive_guides},
-        {"llc", "-proj.llc", true, false,
-         losslesscut_project},  // LosslessCut looks for the song's stem
-        {"ffmetadata", ".ffmetadata.txt", false, false, ffmetadata_chapters},
-        {"edl", ".edl", false, true, edl_markers},
-        {"fcpxml", ".fcpxml", false, true, fcpxml_markers},
-        {"otio", ".otio", false, true, otio_timeline},
-        {"reaper", ".reaper.csv", false, false, reaper_markers},
-    };
-    return formats;
-}
+const std::map<std::string, frame_rate> kFrameRates = {
+    {"23.976", {24000, 1001, 24, false}}, {"24", {24, 1, 24, false}},
+    {"25", {25, 1, 25, false}},           {"29.97", {30000, 1001, 30, false}},
+    {"29.97df", {30000, 1001, 30, true}}, {"30", {30, 1, 30, false}},
+    {"50", {50, 1, 50, false}},           {"59.94", {60000, 1001, 60, false}},
+    {"59.94df", {60000, 1001, 60, true}}, {"60", {60, 1, 60, false}},
+};
 
-const marker_format *find_marker_format(const std::string &word) {
-    for (const marker_format &format : marker_formats()) {
-        if (format.word == word) return &format;
-    }
-    return nullptr;
-}
-
-std::vector<std::string> frame_rate_names() {
-    std::vector<std::string> names;
-    for (const frame_rate &rate : kRates) names.emplace_back(rate.name);
-    return names;
-}
+const std::map<std::string, marker_format> kMarkerFormats = {
+    {"labels", {".labels.txt", false, false, audacity_labels}},
+    {"kdenlive", {".guides.txt", false, false, kdenlive_guides}},
+    // LosslessCut looks for the song's stem.
+    {"llc", {"-proj.llc", true, false, losslesscut_project}},
+    {"ffmetadata", {".ffmetadata.txt", false, false, ffmetadata_chapters}},
+    {"edl", {".edl", false, true, edl_markers}},
+    {"fcpxml", {".fcpxml", false, true, fcpxml_markers}},
+    {"otio", {".otio", false, true, otio_timeline}},
+    {"reaper", {".reaper.csv", false, false, reaper_markers}},
+};
 
 std::string marker_path(const std::string &input, const options &opts) {
     const std::string name = base_name(input);
@@ -302,9 +277,7 @@ std::string marker_path(const std::string &input, const options &opts) {
 }
 
 std::string marker_content(const record &result, const options &opts) {
-    const auto *rate = std::find_if(std::begin(kRates), std::end(kRates),
-                                    [&](const frame_rate &each) { return opts.fps == each.name; });
-    return opts.markers->content(result, *rate);
+    return opts.markers->content(result, kFrameRates.at(opts.fps));
 }
 
 double region_end_ms(const record &result) {

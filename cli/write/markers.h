@@ -4,30 +4,32 @@
 // run/reply.h writes. Follows run/analyse.h.
 #pragma once
 
+#include <map>
 #include <string>
-#include <vector>
 
 #include "cli/options.h"
 #include "cli/run/record.h"
 
-struct frame_rate;  // of video
+// A video frame rate and its timecode format.
+struct frame_rate {
+    int32_t frames;  // the rate is frames / seconds
+    int32_t seconds;
+    int32_t base;  // frame numbers per second of timecode
+    bool drop;     // the timecode skips frame numbers to match the clock
+};
+
+// The rates of --fps by name.
+extern const std::map<std::string, frame_rate> kFrameRates;
 
 struct marker_format {
-    const char *word;    // of --format
     const char *suffix;  // of the file name, after the song's name
     bool drops_ending;   // the extension of the song's name is removed first
     bool counts_frames;  // --fps applies
     std::string (*content)(const record &result, const frame_rate &rate);
 };
 
-// Returns all formats in the order of --help.
-const std::vector<marker_format> &marker_formats();
-
-// Returns the format with this word, or null.
-const marker_format *find_marker_format(const std::string &word);
-
-// Returns the names of the --fps rates, in order.
-std::vector<std::string> frame_rate_names();
+// The formats by their word in --format.
+extern const std::map<std::string, marker_format> kMarkerFormats;
 
 // Returns the path of an input's marker file. A name that is too long for a file system is cut, and
 // a hash is added.
