@@ -7,7 +7,6 @@
 #include <memory>
 #include <numeric>
 
-#include "beat/beat_ctx.h"
 #include "beat/candidates.h"
 #include "beat/gap_fill.h"
 #include "beat/tempo.h"
@@ -15,6 +14,7 @@
 #include "highlight/region.h"
 #include "highlight/search.h"
 #include "pcm/resample.h"
+#include "tests/beat/beat_fixture.h"
 
 extern "C" int __wrap_pthread_create(pthread_t *, const pthread_attr_t *, void *(*)(void *),
                                      void *);
@@ -177,17 +177,9 @@ void find_beats(fuzz::input *in) {
     const auto part = fuzz::values<double>(in, 1200);
     const size_t frames = 1 + std::min<size_t>(part.size() * repeats, 1200);
 
-    std::vector<double> silence(kHopSize * (frames - 1) + kFrameSize);
-    TAVO_CTX ctx = {};
-    TAVO_ONSET_CTX onset = {};
-    TAVO_BEAT_CTX context = {}, *beat = &context;
-    onset.frame_size = kFrameSize;
-    onset.hop_size = kHopSize;
-    ctx.onset = &onset;
-    ctx.ana = silence.data();
-    ctx.ana_len = static_cast<int64_t>(silence.size());
-    ctx.ana_rate = kAnalysisRate;
-    __beat_init(&ctx, beat);
+    working_context work(static_cast<int64_t>(frames));
+    TAVO_BEAT_CTX *beat = &work.beat;
+    TAVO_ONSET_CTX *onset = work.signal.ctx.onset;
     must(beat->signal != nullptr && beat->frame_count == static_cast<int64_t>(frames),
          "a context is complete");
     std::vector<double> env(frames);
@@ -196,22 +188,20 @@ void find_beats(fuzz::input *in) {
     std::copy(env.begin(), env.end(), beat->onset_env);
     for (int32_t &rise : rises) rise %= static_cast<int32_t>(frames);
     std::sort(rises.begin(), rises.end());
-    beat->rise_count = static_cast<int32_t>(rises.size());
-    beat->rise_frames = zeroed_items<int32_t>(beat->rise_count);
-    std::copy(rises.begin(), rises.end(), beat->rise_frames);
+    work.set_rises(rises);
 
     const int32_t bpm = estimate_tempo(beat);
     must(bpm >= 30 && bpm <= 200, "a tempo is 30 to 200");
-    onset.max_beats = limit;
-    onset.bpm = free_tempo != 0 ? free_tempo : bpm;
+    onset->max_beats = limit;
+    onset->bpm = free_tempo != 0 ? free_tempo : bpm;
     std::vector<float> out(static_cast<size_t>(candidate_capacity(beat)));
-    const int32_t count = getBeatCandi_MT(beat, &onset, out.data());
+    const int32_t count = getBeatCandi_MT(beat, onset, out.data());
     must(count >= 0 && (limit < 1 || count <= limit + kMaxAddedBeats), "beats are limited");
     must(std::is_sorted(out.begin(), out.begin() + count), "beats ascend");
     const float last = 1000.0f * beat->frame_times[0] * static_cast<float>(frames + 1);
     must(count == 0 || (out[0] > 0.0f && out[static_cast<size_t>(count) - 1] <= last),
          "beats are in the song");
-    const auto four_beats = static_cast<float>(static_cast<int>(4.0 * 60.0 / onset.bpm));
+    const auto four_beats = static_cast<float>(static_cast<int>(4.0 * 60.0 / onset->bpm));
     auto window = static_cast<size_t>(four_beats / beat->frame_times[0]);
     window += window % 2;
     for (size_t i = window / 2; i + window / 2 + 1 < frames; ++i) {
@@ -219,7 +209,6 @@ void find_beats(fuzz::input *in) {
         std::sort(sorted.begin(), sorted.end());
         must(beat->threshold[i] == sorted[window * 97 / 100], "a threshold is a percentile");
     }
-    __tavo_deinit(beat);
 }
 
 }  // namespace

@@ -6,13 +6,15 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdlib>
-#include <random>
 #include <tuple>
 #include <vector>
 
 #include "beat/beat_ctx.h"
 #include "beat/beats.h"
 #include "common/tavo_ctx.h"
+#include "tests/support/bytes.h"
+
+using support::uniform;
 
 constexpr double kHop = 256.0 / 11025.0;  // seconds
 
@@ -47,11 +49,12 @@ struct working_context {
         __beat_init(&signal.ctx, &beat);
     }
     ~working_context() { __tavo_deinit(&beat); }
+    void set_rises(const std::vector<int32_t> &frames) {
+        beat.rise_count = static_cast<int32_t>(frames.size());
+        beat.rise_frames = zeroed_items<int32_t>(beat.rise_count);
+        std::copy(frames.begin(), frames.end(), beat.rise_frames);
+    }
 };
-
-inline double uniform(std::mt19937 *random) {
-    return static_cast<double>((*random)()) / 2147483648.0 - 1.0;
-}
 
 // Returns random samples, all of one kind: values from -1 to 1, values of any magnitude below
 // 2^highest, mostly zeros, denormal numbers, or zeros of both signs.

@@ -3,7 +3,6 @@
 #include "beat/onset_envelope.h"
 #include "beat/threshold.h"
 #include "tests/beat/beat_fixture.h"
-#include "tests/support/bytes.h"
 #include "tests/support/fault_layer.h"
 
 namespace {

@@ -32,9 +32,7 @@ frames find_beats(const envelope &env) {
         std::fill_n(beat->onset_env + p.frame + 10, env.plateau, 10.0);
     }
     beat->frame_times[0] = env.frame_s;
-    beat->rise_count = static_cast<int32_t>(env.rises.size());
-    beat->rise_frames = zeroed_items<int32_t>(beat->rise_count);
-    std::copy(env.rises.begin(), env.rises.end(), beat->rise_frames);
+    work.set_rises(env.rises);
     work.signal.ctx.onset->bpm = env.bpm;
     work.signal.ctx.onset->max_beats = env.max_beats;
     std::vector<float> out(static_cast<size_t>(candidate_capacity(beat)));

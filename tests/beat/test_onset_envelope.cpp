@@ -16,14 +16,13 @@ bool is_bit_identical(const double *a, const std::vector<double> &b) {
     return true;
 }
 
-// Returns the powers of one analysis frame.
-std::vector<float> frame_powers(const double *samples, int32_t size, const TAVO_FFT_CTX &fft) {
-    const auto n = static_cast<size_t>(size);
+// Returns the powers of one analysis frame. `window` is the Hann window.
+std::vector<float> frame_powers(const double *samples, const std::vector<double> &window,
+                                const TAVO_FFT_CTX &fft) {
+    const size_t n = window.size();
     std::vector<double> re(n), im(n);
-    for (size_t i = 0; i < n; ++i)
-        re[i] =
-            samples[i] * (0.5 * (1.0 - cos(6.283185307179586 * static_cast<int>(i) / (size - 1))));
-    tavo_fft_proc(re.data(), im.data(), static_cast<int16_t>(size), &fft);
+    for (size_t i = 0; i < n; ++i) re[i] = samples[i] * window[i];
+    tavo_fft_proc(re.data(), im.data(), static_cast<int16_t>(n), &fft);
     std::vector<float> powers(n / 2);
     for (size_t j = 0; j < n / 2; ++j)
         powers[j] = static_cast<float>(re[j] * re[j] + im[j] * im[j]);
@@ -37,10 +36,13 @@ std::vector<double> envelope(const TAVO_BEAT_CTX &beat, int32_t size, int32_t ho
     std::vector<std::vector<double>> rows(frames, std::vector<double>(36));
     std::vector<const float *> from;
     std::vector<double *> to;
+    std::vector<double> window;
+    for (int32_t i = 0; i < size; ++i)
+        window.push_back(0.5 * (1.0 - cos(6.283185307179586 * i / (size - 1))));
     TAVO_FFT_CTX fft = {};
     tavo_fft_init(static_cast<int16_t>(size), &fft);
     for (size_t k = 0; k < frames; ++k) {
-        powers.push_back(frame_powers(beat.signal + static_cast<int64_t>(k) * hop, size, fft));
+        powers.push_back(frame_powers(beat.signal + static_cast<int64_t>(k) * hop, window, fft));
         from.push_back(powers[k].data());
         to.push_back(rows[k].data());
     }

@@ -52,10 +52,10 @@ TEST(Fft, IsBitIdenticalToPlainStages) {
         for (double &x : re) x = std::normal_distribution<double>()(random);
         for (double &x : im) x = std::normal_distribution<double>()(random);
         list expected_re = re, expected_im = im;
-        tavo_fft_proc(re.data(), im.data(), size, &ctx);
+        EXPECT_EQ(tavo_fft_proc(re.data(), im.data(), size, &ctx), re.data());
         transform_by_stages(expected_re, expected_im, ctx);
         EXPECT_TRUE(re == expected_re && im == expected_im) << size;
-        tavo_fft_deinit(&ctx);
+        for (int i = 0; i < 2; ++i) tavo_fft_deinit(&ctx);  // the second call must do nothing
     }
 }
 
@@ -95,18 +95,14 @@ TEST(Dft, RefusesLengthsOutsideTheRange) {
     EXPECT_TRUE(re == list({1, 2}) && im == list({3, 4}));
 }
 
+// The logarithm and the exponential are rounded to single precision.
 TEST(Mel, ConvertsBothWays) {
-    for (const auto &[hz, mel] : {std::pair{0.0f, 0.0f},
-                                  {500.0f, 7.499996f},
-                                  {999.9f, 14.998492f},
+    for (const auto &[hz, mel] : {std::pair{999.9f, 14.998492f},
                                   {1000.0f, 15.0f},
-                                  {11025.0f, 49.896507f}})
-        EXPECT_FLOAT_EQ(Hz2Mel(hz), mel);
+                                  {2333.0f, 27.3169632f},
+                                  {2703.0f, 29.457243f}})
+        EXPECT_EQ(Hz2Mel(hz), mel);
     for (const auto &[mel, hz] :
-         {std::pair{7.5f, 500.00027f}, {15.0f, 1000.0f}, {20.0f, 1410.4342f}})
-        EXPECT_FLOAT_EQ(Mel2Hz(mel), hz);
-    // The logarithm and the exponential are rounded to single precision.
-    EXPECT_EQ(Hz2Mel(2333.0f), 27.3169632f);
-    EXPECT_EQ(Hz2Mel(2703.0f), 29.457243f);
-    EXPECT_EQ(Mel2Hz(17.85f), 1216.55334f);
+         {std::pair{7.5f, 500.00027f}, {15.0f, 1000.0f}, {17.85f, 1216.55334f}})
+        EXPECT_EQ(Mel2Hz(mel), hz);
 }

@@ -1,4 +1,4 @@
-// Helpers that make byte strings and files for tests.
+// Helpers that make byte strings, random numbers and files for tests.
 #pragma once
 
 #include <unistd.h>
@@ -21,6 +21,11 @@ inline std::string noise(size_t count, std::mt19937::result_type seed) {
     std::mt19937 random(seed);
     for (char &byte : bytes) byte = static_cast<char>(random() >> 11);
     return bytes;
+}
+
+// Returns a random number from -1 to 1.
+inline double uniform(std::mt19937 *random) {
+    return static_cast<double>((*random)()) / 2147483648.0 - 1.0;
 }
 
 // Returns the items `first` to `end` - 1 of a string or vector.

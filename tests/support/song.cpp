@@ -2,7 +2,8 @@
 
 #include <algorithm>
 #include <cmath>
-#include <fstream>
+
+#include "tests/support/bytes.h"
 
 namespace support {
 namespace {
@@ -28,22 +29,9 @@ constexpr double kFadeSeconds = 0.01;  // duration of each change of the bed's g
 // keeps its shape.
 constexpr double kRootHz[4] = {110.0, 123.47, 98.0, 130.81};
 
-// A xorshift generator of numbers from -1 to 1. The state is never 0.
-struct noise {
-    uint32_t state;
-    double next() {
-        state ^= state << 13;
-        state ^= state >> 17;
-        state ^= state << 5;
-        return static_cast<double>(state) / 2147483648.0 - 1.0;
-    }
-};
-
-noise seeded(uint32_t seed, uint32_t purpose) {
-    noise generator{(seed * 2654435761U) ^ (purpose * 2246822519U) ^ 0x9E3779B9U};
-    if (generator.state == 0) generator.state = 1;
-    for (int i = 0; i < 8; ++i) generator.next();
-    return generator;
+// Returns the random numbers for one part of the song.
+std::mt19937 numbers_for(const song_spec &plan, uint32_t part) {
+    return std::mt19937(1000 * plan.seed + part);
 }
 
 double gain_at(const song_spec &plan, double t) {
@@ -67,10 +55,10 @@ double faded_bed_gain_at(const song_spec &plan, double t) {
 
 // Adds the bed. Saturation gives the bed the loudness-to-peak ratio of recorded music.
 void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
-    noise random = seeded(plan.seed, 100U);
-    double phase = random.next() * kTwoPi;
-    const double offset[2] = {random.next() * kTwoPi, random.next() * kTwoPi};
-    noise floor = seeded(plan.seed, 200U + static_cast<uint32_t>(channel));
+    std::mt19937 random = numbers_for(plan, 100);
+    double phase = uniform(&random) * kTwoPi;
+    const double offset[2] = {uniform(&random) * kTwoPi, uniform(&random) * kTwoPi};
+    std::mt19937 floor = numbers_for(plan, 200 + static_cast<uint32_t>(channel));
     const double level = plan.bed_level * (channel == 0 ? 1.0 : kOtherChannels);
     const double chord_seconds = kChordBeats * 60.0 / plan.bpm;
     for (size_t i = 0; i < out.size(); ++i) {
@@ -80,19 +68,19 @@ void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
         phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / plan.rate;
         const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
                            std::sin(4.0 * phase + offset[1]);
-        out[i] += level * faded_bed_gain_at(plan, t) * std::tanh(sum) + kFloor * floor.next();
+        out[i] += level * faded_bed_gain_at(plan, t) * std::tanh(sum) + kFloor * uniform(&floor);
     }
 }
 
 // Adds a hit that starts at the sample nearest to `t` seconds. Its strength is near 1.
-void add_hit(const song_spec &plan, double t, double strength, noise &random,
+void add_hit(const song_spec &plan, double t, double strength, std::mt19937 *random,
              std::vector<double> &out) {
     const size_t first = static_cast<size_t>(std::llround(t * plan.rate));
     const size_t length = static_cast<size_t>(kHitSeconds * plan.rate);
     const double level = plan.drum_level * strength * gain_at(plan, t);
     for (size_t i = 0; i < length; ++i) {
         const double dt = static_cast<double>(i) / plan.rate;
-        const double burst = random.next() * std::exp(-dt / kNoiseDecay);
+        const double burst = uniform(random) * std::exp(-dt / kNoiseDecay);
         const double kick = std::sin(kTwoPi * kKickHz * dt) * std::exp(-dt / kKickDecay);
         if (first + i < out.size()) out[first + i] += level * (0.8 * burst + 0.7 * kick);
     }
@@ -115,9 +103,8 @@ song make_song(const song_spec &plan) {
     }
 
     std::vector<double> drums(frames, 0.0);
-    noise strengths = seeded(plan.seed, 1);
-    noise bursts = seeded(plan.seed, 2);
-    for (double t : result.hits) add_hit(plan, t, 1.0 + 0.15 * strengths.next(), bursts, drums);
+    std::mt19937 strengths = numbers_for(plan, 1), bursts = numbers_for(plan, 2);
+    for (double t : result.hits) add_hit(plan, t, 1.0 + 0.15 * uniform(&strengths), &bursts, drums);
 
     result.pcm.resize(frames * channels);
     for (size_t c = 0; c < channels; ++c) {
