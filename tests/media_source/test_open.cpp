@@ -105,8 +105,10 @@ TEST_F(OpenClose, DecoderReceivesTheVorbisSetUpData) {
     EXPECT_EQ(decoded.records[0].substr(sizeof frame.data), bytes_of(frame).substr(8));
     EXPECT_EQ(decoded.records[1], zeros(sizeof(wexa_output)));
     EXPECT_TRUE(decoded.records[3] == stream.setup);
-    stream.setup_length = (1 << 24) + 1;
-    EXPECT_EQ(open_row(row_of("ogg"), stream), -7);
+    for (const int32_t false_length : {(1 << 24) + 1, 4'999'999}) {
+        stream.setup_length = false_length;
+        EXPECT_EQ(open_row(row_of("ogg"), stream), -7) << false_length;
+    }
 }
 
 TEST_F(OpenClose, BadHandlesAreRefused) {

@@ -13,22 +13,10 @@ fake_codec::frame pair_frame(int16_t value, int32_t decode_result = 0, int32_t p
     return {{value, value}, 1000 + value, 0, decode_result, produced};
 }
 
-fake_codec::frame unreadable(int32_t read_result) {
-    fake_codec::frame frame = pair_frame(4);
-    frame.read_result = read_result;
-    return frame;
-}
-
-fake_codec::frame with_read_bytes(int32_t bytes) {
-    fake_codec::frame frame = pair_frame(4);
-    frame.read_bytes = bytes;
-    return frame;
-}
-
-fake_codec::frame with_decoded_bytes(int32_t bytes) {
-    fake_codec::frame frame = pair_frame(4);
-    frame.bytes = bytes;
-    return frame;
+// Returns a frame that cannot be read, or with a false size of itself or of its samples.
+fake_codec::frame bad_frame(int32_t read_result, std::optional<int32_t> read_bytes = {},
+                            std::optional<int32_t> bytes = {}) {
+    return {{4, 4}, 1004, read_result, 0, 1, bytes, read_bytes};
 }
 
 // Returns the samples that a source delivers for pair frames: one per frame, or two in Ogg.
@@ -63,7 +51,7 @@ TEST_F(Reading, FramesAreDecodedIntoTheQueue) {
         EXPECT_EQ(fake_codec::call_names(), frame_calls + frame_calls + get);
         if (row.decoder.empty()) return;
         const std::vector<std::string> records = fake_codec::state.calls[1].records;
-        const wexa_frame frame = {nullptr, 0, 16, 0, row.codec, 0, {}};
+        const wexa_frame frame = {nullptr, 0, sizeof(void *), 0, row.codec, 0, {}};
         EXPECT_EQ(records[0].substr(8), bytes_of(frame).substr(8));
         wexa_output output = {};
         output.data = src->q_base;
@@ -81,12 +69,12 @@ TEST_F(Reading, OneUndecodableFrameIsSkipped) {
             frames bad;  // between good frames with the samples 2 and 6
             int32_t code;
             size_t resets;
-        } cases[] = {{{unreadable(2)}, -6, 0},
-                     {{with_read_bytes(-1)}, -6, 0},
-                     {{with_read_bytes(row.frame_bytes + 1)}, -6, 0},
+        } cases[] = {{{bad_frame(2)}, -6, 0},
+                     {{bad_frame(0, -1)}, -6, 0},
+                     {{bad_frame(0, row.frame_bytes + 1)}, -6, 0},
                      // The other cases need a decoder.
-                     {{with_decoded_bytes(-2)}, -6, 0},
-                     {{with_decoded_bytes(too_many)}, -6, 0},
+                     {{bad_frame(0, {}, -2)}, -6, 0},
+                     {{bad_frame(0, {}, too_many)}, -6, 0},
                      {{pair_frame(4, -1)}, 1, 1},
                      {{pair_frame(4, 1), pair_frame(4, 0, 0), pair_frame(4, 1)}, 1, 2},
                      {{pair_frame(4, -1), pair_frame(4, -1), pair_frame(4, -1)}, -6, 2}};
@@ -226,7 +214,7 @@ TEST_F(Reading, SeekAndResetEmptyTheQueue) {
 
 // aac_get_hz reads the rate from the next frame, which is then lost.
 TEST_F(Reading, AacRateComesFromTheNextFrame) {
-    open_frames(row_of("aac"), {with_read_bytes(24'576), with_read_bytes(24'577), pair_frame(6)});
+    open_frames(row_of("aac"), {bad_frame(0, 24'576), bad_frame(0, 24'577), pair_frame(6)});
     EXPECT_EQ(aac_get_hz(src->demux, src->decoder), 44100);
     const wexa_frame frame = {nullptr, 0, 24'576, 0, 306, 0, {}};
     EXPECT_EQ(fake_codec::state.calls[1].records[1].substr(8), bytes_of(frame).substr(8));

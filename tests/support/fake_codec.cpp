@@ -9,15 +9,8 @@ namespace fake_codec {
 namespace {
 
 constexpr size_t kMaxCalls = 1000;
-constexpr int kMaxReadsAfterEnd = 1000;  // later reads fail if `replace` is set
 
 std::mutex mutex;
-
-// The bytes that a reader delivers as a compressed frame.
-struct compressed_frame {
-    char magic[8] = "FCFRAME";
-    const frame *original = nullptr;
-};
 
 template <typename record>
 void record_argument(const record *argument) {
@@ -29,7 +22,7 @@ void record_argument(const record *argument) {
 template <typename... record>
 std::unique_lock<std::mutex> record_call(const char *name, const record *...arguments) {
     std::unique_lock<std::mutex> lock(mutex);
-    if (state.replace || state.calls.size() == kMaxCalls) state.calls.clear();
+    if (state.calls.size() == kMaxCalls) state.calls.clear();
     state.calls.push_back({name});
     (record_argument(arguments), ...);
     return lock;
@@ -41,21 +34,13 @@ int32_t record_misuse(const std::string &reason) {
     return -1;
 }
 
-// Returns the value that the current call reports: the original or the test's replacement.
-template <typename number>
-number replace(const char *value, number original) {
-    if (!state.replace) return original;
-    return static_cast<number>(state.replace(state.calls.back().name, value, original));
-}
-
 // Returns the result of the current call: the next one specified for the function, or the default.
 int32_t next_result(int32_t default_result) {
     std::deque<int32_t> &results = state.results[state.calls.back().name];
-    if (!results.empty()) {
-        default_result = results.front();
-        results.pop_front();
-    }
-    return replace("result", default_result);
+    if (results.empty()) return default_result;
+    const int32_t result = results.front();
+    results.pop_front();
+    return result;
 }
 
 std::string kind_of_call() {
@@ -97,26 +82,23 @@ int32_t read_frame(void *handle, void *buf, int32_t size, int32_t *bytes, int64_
     }
     const stream_spec &stream = *reader->stream;
     const bool past_end = reader->next_frame == stream.frames.size();
-    const frame &next = past_end ? stream.last : stream.frames[reader->next_frame++];
-    const int32_t result = next_result(next.read_result);
+    const frame *next = past_end ? &stream.last : &stream.frames[reader->next_frame++];
+    const int32_t result = next_result(next->read_result);
     if (result != 0) return result;
-    if (state.replace && past_end && ++reader->reads_after_end > kMaxReadsAfterEnd) return -1;
-    compressed_frame compressed;
-    compressed.original = &next;
-    const bool wav = reader->kind == "xwavd";
-    const void *data = wav ? static_cast<const void *>(next.pcm.data()) : &compressed;
-    const size_t length = wav ? next.pcm.size() * 2 : sizeof compressed;
+    const bool wav = reader->kind == "xwavd";  // other readers deliver the frame's address
+    const void *data = wav ? static_cast<const void *>(next->pcm.data()) : &next;
+    const size_t length = wav ? next->pcm.size() * 2 : sizeof next;
     if (size < 0 || length > static_cast<size_t>(size)) {
         return record_misuse("the buffer is too short");
     }
     if (length > 0) memcpy(buf, data, length);
-    *bytes = replace("bytes", next.read_bytes.value_or(static_cast<int32_t>(length)));
-    *first = replace("first", next.start);
+    *bytes = next->read_bytes.value_or(static_cast<int32_t>(length));
+    *first = next->start;
     *second = 0;
     return 0;
 }
 
-int32_t seek(const void *handle, int64_t position, int64_t *reached, int32_t flags) {
+int32_t seek(const void *handle, int64_t *reached, int32_t flags) {
     state.calls.back().number = flags;
     object *reader = find_object(handle);
     if (!reader) return -1;
@@ -126,16 +108,7 @@ int32_t seek(const void *handle, int64_t position, int64_t *reached, int32_t fla
         if (reached && reply.reached) *reached = *reply.reached;
         return next_result(reply.result);
     }
-    const int32_t result = next_result(0);
-    if (result != 0) return result;
-    const int64_t wanted = reader->kind == "xwavd" ? position * 10'000'000 : position;
-    reader->next_frame = 0;
-    for (size_t i = 0; i < stream.frames.size(); ++i) {
-        if (stream.frames[i].start <= wanted) reader->next_frame = i;
-    }
-    *reached =
-        replace("reached", stream.frames.empty() ? 0 : stream.frames[reader->next_frame].start);
-    return 0;
+    return next_result(0);
 }
 
 int32_t decode(const void *handle, const wexa_frame *input, wexa_output *output,
@@ -143,28 +116,23 @@ int32_t decode(const void *handle, const wexa_frame *input, wexa_output *output,
     const auto *bytes = static_cast<const char *>(input->data);
     state.calls.back().records.emplace_back(bytes, input->bytes);
     if (!find_object(handle)) return -1;
-    compressed_frame compressed = {"", nullptr};
-    if (input->bytes >= static_cast<int32_t>(sizeof compressed)) {
-        memcpy(&compressed, bytes, sizeof compressed);
-    }
     status->produced = 0;
-    // Other bytes are an incomplete frame or, without an output buffer, the set-up data.
-    if (strncmp(compressed.magic, compressed_frame().magic, 8) != 0) {
-        return next_result(output->data ? -1 : 0);
-    }
-    const frame &decoded = *compressed.original;
+    if (!output->data) return next_result(0);  // the input is the set-up data
+    const frame *original = nullptr;
+    memcpy(&original, bytes, sizeof original);
+    const frame &decoded = *original;
     const int32_t result = next_result(decoded.decode_result);
     if (result != 0) return result;
     const auto pcm_bytes = static_cast<int32_t>(decoded.pcm.size() * 2);
-    status->produced = replace("produced", decoded.produced);
-    output->bytes = replace("bytes", decoded.bytes.value_or(pcm_bytes));
+    status->produced = decoded.produced;
+    output->bytes = decoded.bytes.value_or(pcm_bytes);
     if (!decoded.pcm.empty()) memcpy(output->data, decoded.pcm.data(), decoded.pcm.size() * 2);
     return 0;
 }
 
 template <typename info>
 void *create_reader(info *record) {
-    record->duration = replace("duration", state.streams.back().duration);
+    record->duration = state.streams.back().duration;
     record->tags = &state.tags.emplace_back();
     record->tags->last = malloc(24);
     for (wexa_tag_text &text : record->tags->text) text.data = malloc(24);
@@ -178,10 +146,9 @@ void *create_reader(info *record) {
 template <typename info>
 void *create_demuxer(info *record, int32_t *count) {
     const std::vector<int32_t> &kinds = state.streams.back().kinds;
-    *count = replace("count",
-                     state.streams.back().kind_count.value_or(static_cast<int32_t>(kinds.size())));
+    *count = state.streams.back().kind_count.value_or(static_cast<int32_t>(kinds.size()));
     for (size_t i = 0; i < kinds.size() && i < std::size(record->kind); ++i) {
-        record->kind[i] = replace("kind", kinds[i]);
+        record->kind[i] = kinds[i];
     }
     return create_reader(record);
 }
@@ -189,12 +156,12 @@ void *create_demuxer(info *record, int32_t *count) {
 // These functions fill information records of any type.
 template <typename info>
 void report_rate(info *record) {
-    record->sample_rate = replace("rate", state.streams.back().sample_rate);
+    record->sample_rate = state.streams.back().sample_rate;
 }
 template <typename info>
 void report_rate_and_channels(info *record) {
     report_rate(record);
-    record->channels = replace("channels", state.streams.back().channels);
+    record->channels = state.streams.back().channels;
 }
 
 }  // namespace
@@ -233,7 +200,7 @@ using namespace fake_codec;
 #define FAKE_SEEK_WITH_FLAGS(function)                                                         \
     int32_t function(void *reader, const int64_t *position, int64_t *reached, int32_t flags) { \
         const auto lock = record_call(__func__, position, reached);                            \
-        return seek(reader, *position, reached, flags);                                        \
+        return seek(reader, reached, flags);                                                   \
     }
 #define FAKE_REMOVAL(function)                   \
     void function(void *handle) {                \
@@ -249,7 +216,7 @@ using namespace fake_codec;
     FAKE_READ(reader##_get_frm)                                                           \
     int32_t reader##_seek(void *handle, const int64_t *position, int64_t *reached) {      \
         const auto lock = record_call(__func__, position, reached);                       \
-        return seek(handle, *position, reached, 0);                                       \
+        return seek(handle, reached, 0);                                                  \
     }                                                                                     \
     FAKE_REMOVAL(reader##_delete)
 #define FAKE_CONTAINER(container, word_type, info_record, count)                               \
@@ -309,9 +276,9 @@ FAKE_REMOVAL(xwavd_delete)
 void *xwavd_create(const mtsrc_io *io, xwav_info *info, int32_t *word) {
     const auto lock = record_call(__func__, io, word, info);
     report_rate_and_channels(info);
-    info->codec = replace("codec", state.streams.back().codec.value_or(kWexaPcm));
-    info->bits = replace("bits", state.streams.back().bits);
-    info->duration = replace("duration", state.streams.back().duration);
+    info->codec = state.streams.back().codec.value_or(kWexaPcm);
+    info->bits = state.streams.back().bits;
+    info->duration = state.streams.back().duration;
     return create_object();
 }
 
@@ -319,7 +286,7 @@ int32_t xmp4fds_get_info_aud(void *stream, xmp4_track *track) {
     const auto lock = record_call(__func__, track);
     find_object(stream);
     report_rate_and_channels(track);
-    track->format_tag = replace("codec", state.streams.back().codec.value_or(kWexaTagAac));
+    track->format_tag = state.streams.back().codec.value_or(kWexaTagAac);
     return next_result(0);
 }
 
@@ -327,7 +294,7 @@ int32_t xoggds_get_info_aud(void *stream, xogg_stream *info) {
     const auto lock = record_call(__func__, info);
     find_object(stream);
     report_rate(info);
-    info->codec = replace("codec", state.streams.back().codec.value_or(323));
+    info->codec = state.streams.back().codec.value_or(323);
     return next_result(0);
 }
 
@@ -344,14 +311,10 @@ int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
     find_object(stream);
     const int32_t result = next_result(0);
     if (result != 0) return result;
-    const std::string &setup = state.streams.back().setup;
-    int32_t reported =
-        state.streams.back().setup_length.value_or(static_cast<int32_t>(setup.size()));
-    if (buf) {  // *length is the buffer's size
-        reported = std::clamp(*length, 0, static_cast<int32_t>(setup.size()));
-        memcpy(buf, setup.data(), static_cast<size_t>(reported));
-    }
-    *length = replace("length", reported);
+    const stream_spec &spec = state.streams.back();
+    const auto size = static_cast<int32_t>(spec.setup.size());
+    if (buf) memcpy(buf, spec.setup.data(), static_cast<size_t>(std::clamp(*length, 0, size)));
+    *length = buf ? size : spec.setup_length.value_or(size);
     return 0;
 }
 }

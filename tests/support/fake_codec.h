@@ -29,7 +29,7 @@ struct frame {
     std::optional<int32_t> read_bytes = {};  // false size of the frame, reported by the reader
 };
 
-// The reply to a seek. By default, a seek moves to the last frame at or before its position.
+// The reply to a seek. By default, a seek succeeds without reporting a position.
 struct seek_reply {
     int32_t result = 0;
     std::optional<int64_t> reached = {};  // if empty, *reached is left unchanged
@@ -45,7 +45,7 @@ struct stream_spec {
     frame last = {{}, 0, kWexaEndOfStream};    // returned by every read after the frames
     std::vector<seek_reply> seeks = {};        // replies to the first seeks of each reader
     std::string setup = "123";                 // Vorbis set-up data
-    std::optional<int32_t> setup_length = {};  // false size of the set-up data
+    std::optional<int32_t> setup_length = {};  // false size of the set-up data, reported first
 };
 
 // A call, with copies of the records that were passed. They are recorded in this order:
@@ -59,15 +59,6 @@ struct call {
     std::vector<const void *> addresses = {};  // where the records were
 };
 
-// Replaces a value that a function is about to report. `value` is the name of the value:
-//   "result": result of any function. An object is only created if it is 0.
-//   "bytes", "first": size and start time of a frame; "reached": position reached by a seek
-//   "produced", "bytes": the decoder's status and the size of its output
-//   "rate", "channels", "bits", "codec", "duration", "count", "kind", "length": of the file
-// The library holds its lock during the call.
-using replacement = int64_t (*)(const std::string &function, const std::string &value,
-                                int64_t original);
-
 // The object of a handle. The FLAC source sets a flag in `reserved`, which must be the first field.
 struct object {
     uint8_t reserved[4096] = {};
@@ -75,19 +66,17 @@ struct object {
     const stream_spec *stream = nullptr;
     const object *demux = nullptr;  // the demuxer that opened this stream, if any
     size_t next_frame = 0;
-    size_t seeks = 0;         // number of replies given
-    int reads_after_end = 0;  // number of reads after the frames
+    size_t seeks = 0;  // number of replies given
 };
 
 struct library_state {
     std::deque<stream_spec> streams = {stream_spec()};  // a new reader uses the last one
     // Results of each function's next calls. An object is created only if its result is 0.
     std::map<std::string, std::deque<int32_t>> results = {};
-    std::vector<call> calls = {};           // the latest calls; if `replace` is set, only the last
+    std::vector<call> calls = {};           // the latest calls
     std::list<object> objects = {};         // the objects that exist
     std::deque<wexa_tags> tags = {};        // all returned tags, with allocated buffers
     std::vector<std::string> misuses = {};  // wrong objects, double deletions, short buffers
-    replacement replace = nullptr;
 };
 // Each test must start with state = {}, assigned while no object exists.
 inline library_state state;
