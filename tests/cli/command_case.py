@@ -51,6 +51,11 @@ def seconds(text):
     return sum(float(part) * 60 ** i for i, part in enumerate(reversed(text.split(":"))))
 
 
+def children(pid):
+    """Returns the process numbers of a process's children."""
+    return [*map(int, pathlib.Path(f"/proc/{pid}/task/{pid}/children").read_text().split())]
+
+
 def send(process, text):
     process.stdin.write(text)
     process.stdin.flush()

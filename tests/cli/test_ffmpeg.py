@@ -5,7 +5,7 @@ import signal
 import subprocess
 
 import numpy as np
-from command_case import Case, song, wav
+from command_case import Case, children, song, wav
 
 SONG = song(seconds=20, bpm=120, loud_at=8)
 
@@ -37,10 +37,6 @@ def find(part, sound):
     """Returns the index in `sound` at which `part` fits best."""
     size = len(part) + len(sound)
     return np.fft.irfft(np.fft.rfft(sound, size) * np.fft.rfft(part, size).conj(), size).argmax()
-
-
-def children(pid):
-    return pathlib.Path(f"/proc/{pid}/task/{pid}/children").read_text().split()
 
 
 class Ffmpeg(Case):
@@ -151,5 +147,5 @@ class Ffmpeg(Case):
         (child,) = self.wait_until(lambda: children(worker))
         stopped.send_signal(signal.SIGINT)
         self.assertEqual(stopped.wait(10), 130)
-        self.assertFalse(pathlib.Path("/proc", child).exists())
+        self.assertFalse(pathlib.Path(f"/proc/{child}").exists())
         self.assertIn(b"ffmpeg made no progress for 30 s", idle.communicate(timeout=60)[1])

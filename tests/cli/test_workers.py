@@ -10,11 +10,7 @@ import subprocess
 import time
 from pathlib import Path
 
-from command_case import TAVO, Case, send, short_song, song, wav
-
-
-def children(process):
-    return map(int, Path(f"/proc/{process.pid}/task/{process.pid}/children").read_text().split())
+from command_case import TAVO, Case, children, send, short_song, song, wav
 
 
 def open_files(pid):
@@ -39,7 +35,7 @@ class Workers(Case):
         """Waits until a worker has opened the file. Returns the worker's pid."""
         def find():
             self.assertIsNone(process.poll(), "the command ended before its time")
-            return [pid for pid in children(process) if str(self.folder / name) in dict(open_files(pid)).values()]
+            return [pid for pid in children(process.pid) if str(self.folder / name) in dict(open_files(pid)).values()]
         return self.wait_until(find)[0]
 
     def assert_results(self, text, *expected):
@@ -70,7 +66,7 @@ class Workers(Case):
         process = self.start("-")  # no file fails if an idle worker is killed
         send(process, b"a.wav\n")
         self.assert_results(process.stdout.readline(), ("a.wav", "ok"))
-        os.kill(*children(process), signal.SIGKILL)
+        os.kill(*children(process.pid), signal.SIGKILL)
         self.assertIn(b"without a file was ended by signal 9", process.stderr.readline())
         out, _ = process.communicate(b"./a.wav\n")
         self.assert_results(out, ("./a.wav", "ok"))
