@@ -11,8 +11,6 @@
 
 namespace {
 
-constexpr Oid kBytesOid = 17;  // type BYTEA in every version of the server
-
 using database = std::shared_ptr<PGconn>;
 
 // Returns the server's text on one line.
@@ -41,44 +39,25 @@ std::string without(std::string text, const std::string &word) {
 // resources, a lock, or a server shutdown or failure. A missing code means a lost connection.
 bool is_permanent(const char *sql_state) {
     if (sql_state == nullptr) return false;
-    const std::string_view code_class(sql_state, 2);
-    for (const char *temporary : {"08", "40", "53", "55", "57", "58"}) {
-        if (code_class == temporary) return false;
-    }
-    return true;
-}
-
-cell column(const PGresult *result, int line, int index) {
-    if (PQgetisnull(result, line, index) != 0) return std::nullopt;
-    const char *text = PQgetvalue(result, line, index);
-    if (PQftype(result, index) != kBytesOid) return text;
-    size_t size = 0;
-    const std::unique_ptr<unsigned char, decltype(&PQfreemem)> raw(
-        PQunescapeBytea(reinterpret_cast<const unsigned char *>(text), &size), PQfreemem);
-    if (raw == nullptr) return std::nullopt;
-    return std::string(reinterpret_cast<const char *>(raw.get()), size);
-}
-
-// Returns the text form of a BYTEA value.
-std::string hex_text(const std::string &bytes) {
-    constexpr const char *kDigits = "0123456789abcdef";
-    std::string text = "\\x";
-    for (const char byte : bytes) {
-        text += {kDigits[static_cast<uint8_t>(byte) >> 4], kDigits[byte & 0xF]};
-    }
-    return text;
+    constexpr std::string_view kTemporary = "08 40 53 55 57 58";  // classes of codes
+    return kTemporary.find(std::string_view(sql_state, 2)) == std::string_view::npos;
 }
 
 failure run(const database &db, const std::string &sql, const row &values,
             const row_reader &on_row) {
-    row texts = values;
-    if (!texts.empty()) texts[0] = hex_text(values[0].value_or(""));
     std::vector<const char *> data;
-    for (const cell &text : texts) data.push_back(text ? text->c_str() : nullptr);
+    std::vector<int> sizes;
+    std::vector<int> formats;
+    for (const cell &value : values) {
+        formats.push_back(data.empty() ? 1 : 0);  // a path is sent as bytes, other values as text
+        data.push_back(value ? value->c_str() : nullptr);
+        sizes.push_back(value ? static_cast<int>(value->size()) : 0);
+    }
+    // The results of a query with values are bytes: those of a path, or of a text.
     const std::unique_ptr<PGresult, decltype(&PQclear)> result(
         values.empty() ? PQexec(db.get(), sql.c_str())
                        : PQexecParams(db.get(), sql.c_str(), static_cast<int>(data.size()), nullptr,
-                                      data.data(), nullptr, nullptr, 0),
+                                      data.data(), sizes.data(), formats.data(), 1),
         PQclear);
     const ExecStatusType status = PQresultStatus(result.get());
     if (status != PGRES_COMMAND_OK && status != PGRES_TUPLES_OK) {
@@ -87,26 +66,25 @@ failure run(const database &db, const std::string &sql, const row &values,
     for (int line = 0; on_row && line < PQntuples(result.get()); ++line) {
         row found;
         for (int i = 0; i < PQnfields(result.get()); ++i) {
-            found.push_back(column(result.get(), line, i));
+            const std::string value(PQgetvalue(result.get(), line, i),
+                                    static_cast<size_t>(PQgetlength(result.get(), line, i)));
+            found.push_back(PQgetisnull(result.get(), line, i) != 0 ? cell() : value);
         }
         on_row(found);
     }
     return {};
 }
 
-// True if libpq finds the end of the password at the last @. Otherwise libpq's messages may quote
-// parts of the password.
-bool is_valid(const std::string &url, size_t last_at) {
-    if (url.find_first_of("/@", url.find("://") + 3) < last_at) return false;
-    const std::unique_ptr<PQconninfoOption, decltype(&PQconninfoFree)> options(
-        PQconninfoParse(url.c_str(), nullptr), PQconninfoFree);
-    return options != nullptr;
-}
-
 failure open_server(const std::string &url, bool /*read_only*/, connection &out) {
     const size_t last_at = url.rfind('@');
     const bool has_user = last_at != std::string::npos;
-    if (has_user && !is_valid(url, last_at)) {
+    const bool has_password = has_user || url.find("password") != std::string::npos;
+    const bool is_ambiguous = has_user && url.find_first_of("/@", url.find("://") + 3) < last_at;
+    const std::unique_ptr<PQconninfoOption, decltype(&PQconninfoFree)> options(
+        PQconninfoParse(url.c_str(), nullptr), PQconninfoFree);
+    // libpq's messages may quote parts of a password if it cannot parse the URL, or if it finds the
+    // end of the password before the last @.
+    if (is_ambiguous || (has_password && options == nullptr)) {
         return {"the URL is not valid; a user name or password has %2F, %40 and %25 for / @ and %",
                 true};
     }
@@ -117,9 +95,7 @@ failure open_server(const std::string &url, bool /*read_only*/, connection &out)
     }
     PQsetNoticeProcessor(
         db.get(), [](void *, const char *) {}, nullptr);
-    out = [db](const std::string &sql, const row &values, const row_reader &on_row) {
-        return run(db, sql, values, on_row);
-    };
+    out = [db](const auto &...arguments) { return run(db, arguments...); };
     return {};
 }
 

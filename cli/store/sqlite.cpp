@@ -1,29 +1,32 @@
 #include <sqlite3.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <iterator>
 #include <memory>
 
 #include "cli/store/database.h"
+#include "cli/system.h"
 
 namespace {
 
-constexpr int kBusyMs = 2000;  // maximum wait while another process writes to the file
+// Waits while another process writes to the file. A stop leaves a quarter of them, so that the
+// last rows can still be stored.
+constexpr int kBusyWaits = 100;
+constexpr useconds_t kBusyWaitUs = 20'000;
 
 using database = std::shared_ptr<sqlite3>;
 
 failure failure_of(const database &db, int code) {
     constexpr int kTemporary[] = {SQLITE_BUSY, SQLITE_LOCKED, SQLITE_CANTOPEN, SQLITE_IOERR,
                                   SQLITE_FULL, SQLITE_NOMEM,  SQLITE_PROTOCOL, SQLITE_INTERRUPT};
-    const auto *end = std::end(kTemporary);
-    const bool is_permanent = std::find(std::begin(kTemporary), end, code & 0xFF) == end;
-    return {sqlite3_errmsg(db.get()), is_permanent};
+    const auto found = std::count(std::begin(kTemporary), std::end(kTemporary), code & 0xFF);
+    return {sqlite3_errmsg(db.get()), found == 0};
 }
 
-cell column(sqlite3_stmt *statement, int index) {
-    if (sqlite3_column_type(statement, index) == SQLITE_NULL) return std::nullopt;
-    const auto *data = static_cast<const char *>(sqlite3_column_blob(statement, index));
-    return std::string(data, static_cast<size_t>(sqlite3_column_bytes(statement, index)));
+int wait_while_busy(void * /*unused*/, int earlier_waits) {
+    usleep(kBusyWaitUs);
+    return earlier_waits < (stop_signal() == 0 ? kBusyWaits : kBusyWaits / 4) ? 1 : 0;
 }
 
 failure run(const database &db, const std::string &sql, const row &values,
@@ -43,12 +46,13 @@ failure run(const database &db, const std::string &sql, const row &values,
         if (code != SQLITE_ROW || !on_row) continue;
         row found;
         for (int i = 0; i < sqlite3_column_count(statement); ++i) {
-            found.push_back(column(statement, i));
+            const auto *text = reinterpret_cast<const char *>(sqlite3_column_text(statement, i));
+            const auto size = static_cast<size_t>(sqlite3_column_bytes(statement, i));
+            found.push_back(text == nullptr ? cell() : std::string(text, size));
         }
         on_row(found);
     }
-    failure failed;
-    if (code != SQLITE_DONE) failed = failure_of(db, code);
+    failure failed = code == SQLITE_DONE ? failure() : failure_of(db, code);
     sqlite3_finalize(statement);
     return failed;
 }
@@ -65,10 +69,10 @@ failure open_file(const std::string &location, bool read_only, connection &out) 
     if (file == nullptr || *file == '\0') {
         return {"'" + location + "' is not a file and would be lost at the end", true};
     }
-    sqlite3_busy_timeout(opened, kBusyMs);
-    out = [db](const std::string &sql, const row &values, const row_reader &on_row) {
-        return run(db, sql, values, on_row);
-    };
+    // Earlier versions kept a write-ahead log, which cannot be read in a read-only folder.
+    if (!read_only) sqlite3_exec(opened, "PRAGMA journal_mode=DELETE", nullptr, nullptr, nullptr);
+    sqlite3_busy_handler(opened, wait_while_busy, nullptr);
+    out = [db](const auto &...arguments) { return run(db, arguments...); };
     return {};
 }
 

@@ -5,7 +5,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <filesystem>
 #include <functional>
 #include <iterator>
@@ -24,8 +23,8 @@ using std::chrono::steady_clock;
 constexpr size_t kLongestPath = 2600;
 constexpr size_t kBatchRows = 100;
 constexpr milliseconds kBatchAge{2000};
-constexpr int64_t kFirstWaitMs = 500;  // doubled each time
-constexpr int64_t kLongestWaitMs = 30'000;
+constexpr milliseconds kFirstWait{500};  // doubled each time
+constexpr milliseconds kLongestWait{30'000};
 constexpr useconds_t kSliceUs = 50'000;  // time between two checks for a stop
 
 // ---- The table and its SQL.
@@ -35,30 +34,28 @@ constexpr useconds_t kSliceUs = 50'000;  // time between two checks for a stop
 constexpr int kTableVersion = 2;
 constexpr size_t kAddedColumns = 2;
 
-enum class column_type { text, whole, real, list };  // list: a JSON array of numbers
-
-// A column that holds part of the result, and the key of that part in JSON.
+// A column that holds part of the result, and the key and type of that part in JSON. An array has
+// numbers only.
 struct result_column {
     const char *name;
     const char *key;
-    column_type type;
+    bool (json::*has_type)() const noexcept;
 };
 constexpr result_column kResultColumns[] = {
-    {"status", "status", column_type::text},
-    {"sentence", "error", column_type::text},
-    {"sample_rate", "sample_rate", column_type::whole},
-    {"channels", "channels", column_type::whole},
-    {"duration_ms", "duration_ms", column_type::whole},
-    {"hl_pos_ms", "hl_pos_ms", column_type::whole},
-    {"hl_end_ms", "hl_end_ms", column_type::whole},
-    {"hl_refined", "hl_refined", column_type::whole},
-    {"bpm", "bpm", column_type::whole},
-    {"beats_ms", "beats_ms", column_type::list},
-    {"cpu_ms", "cpu_ms", column_type::whole},
-    {"offset_ms", "offset_ms", column_type::real},
-    {"decoder", "decoder", column_type::text},
+    {"status", "status", &json::is_string},
+    {"sentence", "error", &json::is_string},
+    {"sample_rate", "sample_rate", &json::is_number_integer},
+    {"channels", "channels", &json::is_number_integer},
+    {"duration_ms", "duration_ms", &json::is_number_integer},
+    {"hl_pos_ms", "hl_pos_ms", &json::is_number_integer},
+    {"hl_end_ms", "hl_end_ms", &json::is_number_integer},
+    {"hl_refined", "hl_refined", &json::is_number_integer},
+    {"bpm", "bpm", &json::is_number_integer},
+    {"beats_ms", "beats_ms", &json::is_array},
+    {"cpu_ms", "cpu_ms", &json::is_number_integer},
+    {"offset_ms", "offset_ms", &json::is_number},
+    {"decoder", "decoder", &json::is_string},
 };
-constexpr const char *kKey = "path, mode, length_s, max_beats";
 
 // Selects a song's status. The values are the key, the size and the modification time, $1 to $6.
 constexpr const char *kStatusQuery =
@@ -76,29 +73,30 @@ constexpr const char *kCreateTable =
     "PRIMARY KEY (path, mode, length_s, max_beats))";
 
 // Returns the statement that inserts a row or replaces the row with the same key. The values are
-// the key, the size, the modification time and the cells of append_result_cells.
+// the key and the cells of cells_of.
 std::string put_statement() {
-    std::vector<std::string> others = {"size", "mtime_ns"};
-    for (const result_column &column : kResultColumns) others.emplace_back(column.name);
-    others.insert(others.end(), {"version", "host"});
-    std::string names = kKey;
-    std::string values = "$1, $2, $3, $4";
-    std::string changes = "finished = excluded.finished";
-    for (size_t i = 0; i < others.size(); ++i) {
-        names += ", " + others[i];
-        values += ", $" + std::to_string(i + 5);
-        changes += ", " + others[i] + " = excluded." + others[i];
+    std::vector<std::string> names = {"path", "mode", "length_s", "max_beats", "size", "mtime_ns"};
+    for (const result_column &column : kResultColumns) names.emplace_back(column.name);
+    names.insert(names.end(), {"version", "host"});
+    std::string columns = "finished";
+    std::string values = "CURRENT_TIMESTAMP";
+    for (size_t i = 0; i < names.size(); ++i) {
+        columns += ", " + names[i];
+        values += ", $" + std::to_string(i + 1);
     }
-    return "INSERT INTO songs (" + names + ", finished) VALUES (" + values +
-           ", CURRENT_TIMESTAMP) ON CONFLICT (" + kKey + ") DO UPDATE SET " + changes;
+    return "INSERT INTO songs (" + columns + ") VALUES (" + values +
+           ") ON CONFLICT (path, mode, length_s, max_beats) DO UPDATE SET (" + columns + ") = (" +
+           values + ")";
 }
 
 // Returns the query for the next songs after a path, in the order of their paths. $1 to $4 are the
-// key, with that path as $1; $5 is the status.
+// key, with that path as $1; $5 is the status. Its columns are bytes or text.
 std::string page_query(int version) {
     const size_t count = std::size(kResultColumns) - (version < kTableVersion ? kAddedColumns : 0);
     std::string columns = "path";
-    for (size_t i = 0; i < count; ++i) columns += std::string(", ") + kResultColumns[i].name;
+    for (size_t i = 0; i < count; ++i) {
+        columns += std::string(", CAST(") + kResultColumns[i].name + " AS TEXT)";
+    }
     return "SELECT " + columns +
            " FROM songs WHERE path > $1 AND mode = $2 AND length_s = $3 AND max_beats = $4 AND "
            "status = $5 ORDER BY path LIMIT 500";
@@ -106,34 +104,31 @@ std::string page_query(int version) {
 
 // ---- Conversion between rows and JSON.
 
-cell cell_of(const json &result, const char *key) {
-    const auto found = result.find(key);
-    if (found == result.end()) return std::nullopt;
-    if (found->is_boolean()) return found->get<bool>() ? "1" : "0";
-    return found->is_string() ? found->get<std::string>() : found->dump();
+cell cell_of(const json &value) {
+    if (value.is_null()) return std::nullopt;
+    if (value.is_boolean()) return value.get<bool>() ? "1" : "0";
+    return value.is_string() ? value.get<std::string>() : value.dump();
 }
 
-void append_result_cells(row &cells, const std::string &text) {
-    const json result = json::parse(text);
+// Returns the cells of a row after its key, except the time.
+row cells_of(const stored_song &song) {
+    row cells = {std::to_string(song.file.size), std::to_string(song.file.mtime_ns)};
+    const json result = json::parse(song.result);
     for (const result_column &column : kResultColumns) {
-        cells.push_back(cell_of(result, column.key));
+        cells.push_back(cell_of(result.value(column.key, json())));
     }
-    std::array<char, 256> host{};
-    gethostname(host.data(), host.size() - 1);
-    cells.insert(cells.end(), {TAVO_VERSION, as_utf8(host.data())});
+    std::string host(256, '\0');
+    gethostname(host.data(), host.size());
+    cells.insert(cells.end(), {TAVO_VERSION, as_utf8(host.c_str())});
+    return cells;
 }
 
 // Reads the text of a cell as JSON. Returns false if it is damaged.
-bool read_value(const std::string &text, column_type type, json &value) {
-    if (type == column_type::text) {
-        value = as_utf8(text);
-        return true;
-    }
-    value = json::parse(text, nullptr, false);
-    if (type == column_type::whole) return value.is_number_integer();
-    if (type == column_type::real) return value.is_number();
-    return value.is_array() &&
-           std::all_of(value.begin(), value.end(), std::mem_fn(&json::is_number));
+bool read_value(const std::string &text, const result_column &column, json &value) {
+    const bool is_text = column.has_type == &json::is_string;
+    value = is_text ? json(as_utf8(text)) : json::parse(text, nullptr, false);
+    return (value.*column.has_type)() &&
+           (is_text || std::all_of(value.begin(), value.end(), std::mem_fn(&json::is_number)));
 }
 
 // Converts a row of page_query to a song. Its result lacks the file's name.
@@ -143,7 +138,7 @@ stored_song song_of(const row &cells, int32_t mode) {
     json object = {{"mode", mode_word(mode)}};
     for (size_t i = 1; i < cells.size(); ++i) {
         const result_column &column = kResultColumns[i - 1];
-        if (!cells[i] || read_value(*cells[i], column.type, object[column.key])) continue;
+        if (!cells[i] || read_value(*cells[i], column, object[column.key])) continue;
         song.damage = {std::string("Its row in the store is damaged: ") + column.name +
                        " cannot be read."};
         return song;
@@ -154,21 +149,17 @@ stored_song song_of(const row &cells, int32_t mode) {
 
 // ---- The connection.
 
-// Returns null if the program was built without PostgreSQL. PostgreSQL's client library depends on
-// two dozen others, so the module that needs it is loaded on demand.
-const database_kind *postgresql_database() {
-    void *module = dlopen("libtavo_postgresql.so", RTLD_NOW | RTLD_LOCAL);
-    if (module == nullptr) return nullptr;
-    return static_cast<const database_kind *>(dlsym(module, "tavo_postgresql_database"));
-}
-
 // Finds the kind of database for the store's URL.
 failure find_database(store &db) {
     const std::string &url = db.opts.store;
     db.location = url;
     if (url.rfind("postgresql://", 0) == 0 || url.rfind("postgres://", 0) == 0) {
-        db.kind = postgresql_database();
-        return {db.kind == nullptr ? "This tavo was built without PostgreSQL." : ""};
+        // PostgreSQL's client library depends on two dozen others, so the module that needs it is
+        // loaded on demand. A program that was built without PostgreSQL lacks the module.
+        void *module = dlopen("libtavo_postgresql.so", RTLD_NOW | RTLD_LOCAL);
+        void *kind = module == nullptr ? nullptr : dlsym(module, "tavo_postgresql_database");
+        db.kind = static_cast<const database_kind *>(kind);
+        return {kind == nullptr ? "This tavo was built without PostgreSQL." : ""};
     }
     if (url.rfind("sqlite:", 0) == 0) {
         db.location = url.substr(7);
@@ -180,31 +171,29 @@ failure find_database(store &db) {
     return {db.kind == nullptr ? "This tavo was built without SQLite." : ""};
 }
 
-failure connect(store &db) {
-    return db.run ? failure() : db.kind->open(db.location, db.opts.from_store, db.run);
-}
-
 // Connects and does the work. After a temporary failure, retries both for at most --patience.
 failure persist(store &db, const std::function<failure()> &work) {
-    const auto start = steady_clock::now();
-    for (int64_t wait_ms = kFirstWaitMs;; wait_ms = std::min(2 * wait_ms, kLongestWaitMs)) {
-        failure failed = connect(db);
+    const auto deadline = steady_clock::now() + std::chrono::seconds(db.opts.patience_s);
+    for (milliseconds wait = kFirstWait;; wait = std::min(2 * wait, kLongestWait)) {
+        failure failed;
+        if (!db.run) failed = db.kind->open(db.location, db.opts.from_store, db.run);
+        // At the start of the command, a missing file or server means that the URL is wrong.
+        if (failed && !db.is_open) failed.is_permanent = true;
         if (!failed) failed = work();
         if (!failed) return {};
         db.run = nullptr;
-        const auto left = std::chrono::seconds(db.opts.patience_s) - (steady_clock::now() - start);
-        const int64_t left_ms = std::chrono::duration_cast<milliseconds>(left).count();
         const std::string reason = shown(failed.sentence);
-        if (!failed.is_permanent && left_ms > 0) {
-            wait_ms = std::min(wait_ms, left_ms);
+        const auto now = steady_clock::now();
+        if (!failed.is_permanent && now < deadline && stop_signal() == 0) {
+            const auto end = std::min<steady_clock::time_point>(now + wait, deadline);
             fprintf(stderr, "tavo: the store does not answer (%s); trying again in %.1f s.\n",
-                    reason.c_str(), static_cast<double>(wait_ms) / 1000.0);
-            const auto end = steady_clock::now() + milliseconds(wait_ms);
+                    reason.c_str(), std::chrono::duration<double>(end - now).count());
             while (stop_signal() == 0 && steady_clock::now() < end) usleep(kSliceUs);
             if (stop_signal() == 0) continue;
         }
         db.has_failed = true;
-        return {"the store is given up: " + reason + "."};
+        return {(db.is_open ? "the store is given up: " : "The store cannot be used: ") + reason +
+                "."};
     }
 }
 
@@ -214,8 +203,12 @@ failure read_version(store &db) {
     });
 }
 
-// Creates the table or adds missing columns, in one transaction.
-failure upgrade(store &db) {
+// Checks the version of the table. Unless the store is only read, creates the table or adds missing
+// columns, in one transaction.
+failure open_table(store &db) {
+    if (failure failed = read_version(db)) return failed;
+    if (db.version > kTableVersion) return {"it was written by a newer tavo", true};
+    if (db.opts.from_store || db.version == kTableVersion) return {};
     if (failure failed = db.run(db.kind->begin_upgrade, {}, nullptr)) return failed;
     // Another command may have upgraded the table meanwhile.
     if (failure failed = read_version(db)) return failed;
@@ -229,68 +222,30 @@ failure upgrade(store &db) {
     return {};
 }
 
-failure open_table(store &db) {
-    if (failure failed = connect(db)) return failed;
-    if (failure failed = read_version(db)) return failed;
-    if (db.version > kTableVersion) return {"it was written by a newer tavo", true};
-    return db.opts.from_store || db.version == kTableVersion ? failure() : upgrade(db);
-}
-
 // ---- Batches and pages.
 
-// Returns the four values of the key, in order.
-row key_of(const store &db, const std::string &path) {
-    return {path, mode_word(db.opts.mode), std::to_string(db.opts.length_s),
-            std::to_string(db.opts.max_beats)};
-}
-
-// Returns the values of the key, the size and the modification time.
-row values_of(const store &db, const std::string &path, const file_state &file) {
-    row values = key_of(db, path);
-    values.insert(values.end(), {std::to_string(file.size), std::to_string(file.mtime_ns)});
-    return values;
-}
-
-failure write_batch(const store &db) {
-    const std::string sql = put_statement();
-    if (failure failed = db.run("BEGIN", {}, nullptr)) return failed;
-    for (const stored_song &song : db.batch) {
-        row values = values_of(db, song.path, song.file);
-        append_result_cells(values, song.result);
-        if (failure failed = db.run(sql, values, nullptr)) return failed;
-    }
-    return db.run("COMMIT", {}, nullptr);
+// Returns the values of the key, followed by other values.
+row values_of(const store &db, const std::string &path, row others) {
+    others.insert(others.begin(), {path, mode_word(db.opts.mode), std::to_string(db.opts.length_s),
+                                   std::to_string(db.opts.max_beats)});
+    return others;
 }
 
 failure commit_batch(store &db) {
     if (db.batch.empty() || db.has_failed) return {};
-    if (failure failed = persist(db, [&] { return write_batch(db); })) return failed;
+    const auto write_rows = [&]() -> failure {
+        if (failure failed = db.run("BEGIN", {}, nullptr)) return failed;
+        const std::string sql = put_statement();
+        for (const stored_song &song : db.batch) {
+            const row values = values_of(db, song.path, cells_of(song));
+            if (failure failed = db.run(sql, values, nullptr)) return failed;
+        }
+        return db.run("COMMIT", {}, nullptr);
+    };
+    if (failure failed = persist(db, write_rows)) return failed;
     db.stored += static_cast<int64_t>(db.batch.size());
     db.batch.clear();
     return {};
-}
-
-failure read_page(store &db) {
-    return persist(db, [&] {
-        db.page.clear();
-        row values = key_of(db, db.last_path);
-        values.emplace_back(db.opts.failed ? "failed" : "ok");
-        return db.run(page_query(db.version), values,
-                      [&](const row &cells) { db.page.push_back(song_of(cells, db.opts.mode)); });
-    });
-}
-
-std::string summary_text(const store &db) {
-    std::string text = std::to_string(db.stored) + " stored";
-    if (db.known > 0) text += ", " + std::to_string(db.known) + " known already";
-    if (db.known_failed > 0) {
-        text += " (" + std::to_string(db.known_failed) + " failed; --retry-failed)";
-    }
-    if (!db.batch.empty()) {
-        text += "; " + count_text(db.batch.size(), "result") +
-                " could not be stored and went to standard output";
-    }
-    return "tavo: " + text + ".\n";
 }
 
 }  // namespace
@@ -299,9 +254,9 @@ failure open_store(store &db, const options &opts) {
     if (opts.store.empty()) return {};
     db.opts = opts;
     if (failure failed = find_database(db)) return failed;
-    const failure failed = open_table(db);
-    if (!failed) return {};
-    return {"The store cannot be used: " + shown(failed.sentence) + "."};
+    failure failed = persist(db, [&] { return open_table(db); });
+    db.is_open = !failed;
+    return failed;
 }
 
 failure find_song(store &db, const std::string &path, file_state &file, bool &is_new) {
@@ -312,8 +267,10 @@ failure find_song(store &db, const std::string &path, file_state &file, bool &is
     file.mtime_ns = int64_t{info.st_mtim.tv_sec} * 1'000'000'000 + info.st_mtim.tv_nsec;
     if (db.opts.redo) return {};
     std::string status;
+    const row values =
+        values_of(db, path, {std::to_string(file.size), std::to_string(file.mtime_ns)});
     failure failed = persist(db, [&] {
-        return db.run(kStatusQuery, values_of(db, path, file),
+        return db.run(kStatusQuery, values,
                       [&](const row &cells) { status = cells[0].value_or(""); });
     });
     const bool is_failed = status == "failed";
@@ -334,19 +291,24 @@ failure add_song(store &db, stored_song &&song) {
 }
 
 failure commit_old_batch(store &db) {
-    const bool is_old = steady_clock::now() - db.batch_since >= kBatchAge;
-    return is_old ? commit_batch(db) : failure();
+    return steady_clock::now() - db.batch_since < kBatchAge ? failure() : commit_batch(db);
 }
 
 failure read_next(store &db, stored_song &song, bool &found) {
     found = false;
     if (db.page.empty()) {
-        if (failure failed = read_page(db)) return failed;
-        if (db.page.empty()) return {};
-        db.last_path = db.page.back().path;
+        const row values = values_of(db, db.last_path, {db.opts.failed ? "failed" : "ok"});
+        failure failed = persist(db, [&] {
+            db.page.clear();  // rows of a failed attempt
+            return db.run(page_query(db.version), values, [&](const row &cells) {
+                db.page.push_back(song_of(cells, db.opts.mode));
+            });
+        });
+        if (failed || db.page.empty()) return failed;
     }
     song = std::move(db.page.front());
     db.page.pop_front();
+    db.last_path = song.path;
     found = true;
     return {};
 }
@@ -355,6 +317,16 @@ failure close_store(store &db, std::string &summary) {
     if (db.kind == nullptr) return {};
     failure failed = commit_batch(db);
     for (const stored_song &song : db.batch) write_all(STDOUT_FILENO, song.result);
-    if ((!db.opts.quiet && !db.opts.from_store) || !db.batch.empty()) summary = summary_text(db);
+    if ((db.opts.quiet || db.opts.from_store) && db.batch.empty()) return failed;
+    summary = "tavo: " + std::to_string(db.stored) + " stored";
+    if (db.known > 0) summary += ", " + std::to_string(db.known) + " known already";
+    if (db.known_failed > 0) {
+        summary += " (" + std::to_string(db.known_failed) + " failed; --retry-failed)";
+    }
+    if (!db.batch.empty()) {
+        summary += "; " + count_text(db.batch.size(), "result") +
+                   " could not be stored and went to standard output";
+    }
+    summary += ".\n";
     return failed;
 }

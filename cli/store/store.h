@@ -35,22 +35,23 @@ struct store {
     std::string location;
     connection run;                  // null while disconnected
     int version = 0;                 // of the table
+    bool is_open = false;            // the table was found or created
     bool has_failed = false;         // the store is no longer used, and the command ends
     std::vector<stored_song> batch;  // not committed yet
     std::chrono::steady_clock::time_point batch_since;
     std::deque<stored_song> page;  // with --from-store: rows read but not yet returned
-    std::string last_path;         // of the page
+    std::string last_path;         // of the row returned last
     int64_t stored = 0;            // rows committed
     int64_t known = 0;             // songs skipped because they are stored
     int64_t known_failed = 0;      // of these, songs stored as failed
 };
 
-// Connects and, unless the store is only read, creates or upgrades the table. Does not retry.
-failure open_store(store &db, const options &opts);
-
-// If the database does not answer, the following functions retry with growing pauses, for at most
+// If the database does not answer, these functions retry with growing pauses, for at most
 // --patience. Each pause is reported on standard error, and a stop ends it early. After a failure
 // the store is no longer used.
+
+// Connects, without a retry. Unless the store is only read, creates or upgrades the table.
+failure open_store(store &db, const options &opts);
 
 // Sets is_new if the song must be analysed, because its current file is not stored for these
 // parameters or the options request another analysis. `file` receives the state of that file.
