@@ -7,8 +7,10 @@ const [out, engine, wasm, page, ...parts] = process.argv.slice(2);
 const texts = { "engine.js": fs.readFileSync(engine, "utf8"),
   "engine.wasm": zlib.gzipSync(fs.readFileSync(wasm), { level: 9 }).toString("base64") };
 for (const part of parts) texts[part.replace(/.*\//, "")] = fs.readFileSync(part, "utf8");
-const song = texts["song.html"].replace("@STYLE@", () => texts["page.css"]).replace("@SCRIPT@", () => texts["shared.js"] + texts["song.js"]);
-texts["song.html"] = JSON.stringify(song).replace(/</g, "\\u003c");
+const inserts = { STYLE: texts["page.css"], MAIN: texts["song.html"], DATA: "@DATA@",
+  SCRIPT: texts["shared.js"] + texts["song.js"] };
+const song = texts["page.html"].replace(/@([A-Z]+)@/g, (_, name) => inserts[name]);
+texts["page.html"] = JSON.stringify(song).replace(/</g, "\\u003c");
 fs.writeFileSync(out, fs.readFileSync(page, "utf8").replace(/@([a-z]+\.[a-z]+)@/g, (_, name) => {
   if (texts[name] === undefined) throw new Error("no part " + name);
   return texts[name];

@@ -93,8 +93,6 @@ function add(files) {
     const row = byId("songs").tBodies[0].insertRow();
     const entry = { file, cells: [0, 1, 2, 3, 4].map(() => row.insertCell()), mode: Number(byId("mode").value),
       length: Math.floor(byId("length").value) || 0, maxBeats: Math.floor(byId("maxbeats").value) || 0 };
-    entry.cells[0].className = "name";
-    entry.cells.slice(1).forEach((cell) => { cell.className = "number"; });
     fill(entry, [file.name, "waiting"]);
     queue.push(entry);
   }

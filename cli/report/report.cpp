@@ -1,8 +1,5 @@
 #include "cli/report/report.h"
 
-#include <sys/stat.h>
-
-#include <cerrno>
 #include <cinttypes>
 #include <cstdint>
 #include <filesystem>
@@ -56,20 +53,9 @@ failure add_sound(const std::string &song_path, const std::string &page_path, bo
     return {};
 }
 
-// Returns JSON that is safe in a script element.
+// Returns one line of JSON that is safe in a script element.
 std::string script_json(const result_json &value) {
-    return replaced(value.dump(), {{'<', "\\u003c"}});
-}
-
-// Returns a song's line in the data of the index. `page` is the path of the song's page, relative
-// to the index.
-std::string index_row(const result_json &view, const std::string &page) {
-    result_json row = {{"page", percent_encoded(page)}};
-    for (const char *key :
-         {"file", "duration_ms", "offset_ms", "bpm", "hl_pos_ms", "beat_count", "loudness"}) {
-        if (view.contains(key)) row[key] = view[key];
-    }
-    return script_json(row) + "\n";
+    return replaced(value.dump(), {{'<', "\\u003c"}}) + "\n";
 }
 
 // Returns the path of the folder for the songs' pages, next to the index.
@@ -98,25 +84,29 @@ failure write_report_page(const record &result, const options &opts, const std::
     result_json view;
     if (failure failed = read_song_view(result, stop_fd, view)) return failed;
     const std::string page = base_name(pages_folder(opts)) + "/" + base_name(target);
-    row = index_row(view, page);
+    result_json values = {{"page", percent_encoded(page)}};
+    for (const char *key :
+         {"file", "duration_ms", "offset_ms", "bpm", "hl_pos_ms", "beat_count", "loudness"}) {
+        if (view.contains(key)) values[key] = view[key];
+    }
+    row = script_json(values);
     if (failure failed = add_sound(result.file, target, opts.embed, view)) return failed;
     return write_file(target, kSongPage[0] + script_json(view) + kSongPage[1], opts.force);
 }
 
 std::string failed_report_row(const record &result) {
-    const result_json row = {{"file", as_utf8(base_name(result.file))},
-                             {"error", as_utf8(result.error)}};
-    return script_json(row) + "\n";
+    return script_json(
+        {{"file", as_utf8(base_name(result.file))}, {"error", as_utf8(result.error)}});
 }
 
 failure begin_report_index(output_file &index, const options &opts) {
     if (opts.report.empty() || takes_one_file(opts)) return {};
     if (failure failed = check_report(opts.report, opts.force)) return failed;
     const std::string folder = pages_folder(opts);
-    std::error_code ignored;
-    const bool is_there = fs::symlink_status(folder, ignored).type() == fs::file_type::directory;
-    if (!is_there && mkdir(folder.c_str(), 0777) != 0) {
-        return {system_sentence("The folder " + shown(folder) + " cannot be made", errno)};
+    std::error_code code;
+    fs::create_directory(folder, code);
+    if (code) {
+        return {system_sentence("The folder " + shown(folder) + " cannot be made", code.value())};
     }
     if (failure failed = begin_output(index, opts.report)) return failed;
     return add_report_row(index, kIndexPage[0]);

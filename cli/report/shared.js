@@ -24,12 +24,17 @@ function toPlayerTime(song) {
   return song;
 }
 
-// Returns a new SVG element, appended to the parent unless that is null.
+// Returns a new SVG element, appended to the parent if there is one.
 function shape(name, attributes, parent) {
   const made = document.createElementNS("http://www.w3.org/2000/svg", name);
   for (const key in attributes) made.setAttribute(key, attributes[key]);
-  if (parent !== null) parent.append(made);
+  parent?.append(made);
   return made;
+}
+
+// Draws a line through points, which are pairs of x and y. A style of the class may fill it.
+function drawLine(kind, points, parent) {
+  return shape("polyline", { class: kind, points: points.join(" ") }, parent);
 }
 
 function download(name, type, content) {
