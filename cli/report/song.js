@@ -4,7 +4,7 @@ const beats = song.beats_ms || [];
 const soundStart = -song.offset_ms;
 const songEnd = Math.max(soundStart + song.read_ms, song.hl_pos_ms || 0, ...beats.slice(-1));
 const hasHighlight = song.hl_pos_ms !== undefined;
-const loopEnd = Math.min(song.region_end_ms, songEnd);
+const loopEnd = Math.min(song.region_end_ms, songEnd - 100);  // before the end, where playing stops
 const timeline = byId("timeline");
 const svg = timeline.querySelector("svg");
 const view = { from: 0, span: songEnd };
@@ -140,7 +140,7 @@ const embedded = {
     this.node = null;
   },
   seek(ms) {
-    const running = this.node !== null;
+    const running = this.playing();
     this.pause();
     this.offset = ms / 1000;
     if (running) this.play();

@@ -146,7 +146,7 @@ class Report(Browser):
             for embed in ([], ["--embed"]):
                 with self.subTest(name=name, embed=embed):
                     path = self.put("deep/" + os.fsdecode(name), source=SONGS / source)
-                    self.run_tavo("--report", "page.html", "--force", *embed, path)
+                    self.run_tavo("--report", "page.html", "--length", "99", "--force", *embed, path)
                     if embed:
                         path.unlink()
                     self.show("page.html")
@@ -154,6 +154,17 @@ class Report(Browser):
                     note = self.find("#status")[0].text
                     self.assertEqual("--embed" in note, name == b"bare.aac" and not embed, note)
                     self.assert_plays()
+                    # At the end of the song, Loop starts the highlight again, and Play starts the song again, once.
+                    self.click("loop", "play")
+                    self.script("seek(songEnd - 300)")
+                    self.wait("player.now() < songEnd - 1000")
+                    self.click("loop")
+                    self.script("seek(songEnd - 300)")
+                    self.wait("!player.playing()")
+                    self.script("window.starts = 0; const play = embedded.play;"
+                                "embedded.play = () => { ++starts; return play.call(embedded); };")
+                    self.assert_plays()
+                    self.assertEqual(self.script("return starts"), len(embed))
 
     def test_index(self):
         names = ["b \"#1.wav", "a.wav", "bad <i>&.wav", "c.wav"]
