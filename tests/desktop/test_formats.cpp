@@ -159,8 +159,10 @@ TEST(Reader, AgreesWithFfmpeg) {
         const samples got = read_all(fixture(each.file)),
                       expected = mix_with_ffmpeg(each.reference, each.channels);
         ASSERT_EQ(got.size() + each.dropped, expected.size());
+        int largest = 0;  // difference
         for (size_t i = 0; i < got.size(); ++i)
-            ASSERT_LE(std::abs(got[i] - expected[i + each.dropped]), each.tolerance) << i;
+            largest = std::max(largest, std::abs(got[i] - expected[i + each.dropped]));
+        EXPECT_LE(largest, each.tolerance);
     }
 }
 

