@@ -17,8 +17,9 @@ using row = std::vector<cell>;
 using row_reader = std::function<void(const row &)>;  // may be null
 
 // An open connection. Runs a statement with `values` as $1, $2 and so on, and calls on_row for each
-// row of the result. $1 is always a path. A failure has the database's message and is permanent
-// if the file is damaged or a table or permission is missing.
+// row of the result. $1 is always a path, and a query with values selects only paths and texts. A
+// failure has the database's message and is permanent if the file is damaged or a table or
+// permission is missing.
 using connection =
     std::function<failure(const std::string &sql, const row &values, const row_reader &on_row)>;
 

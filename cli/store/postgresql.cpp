@@ -53,7 +53,7 @@ failure run(const database &db, const std::string &sql, const row &values,
         data.push_back(value ? value->c_str() : nullptr);
         sizes.push_back(value ? static_cast<int>(value->size()) : 0);
     }
-    // The results of a query with values are bytes: those of a path, or of a text.
+    // With values, the results have binary form: the bytes of a path or a text.
     const std::unique_ptr<PGresult, decltype(&PQclear)> result(
         values.empty() ? PQexec(db.get(), sql.c_str())
                        : PQexecParams(db.get(), sql.c_str(), static_cast<int>(data.size()), nullptr,
