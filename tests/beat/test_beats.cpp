@@ -43,21 +43,6 @@ std::vector<float> track_of(const std::vector<float> &beats, int64_t n) {
 
 }  // namespace
 
-// With max_beats 1, the beat is where quiet noise becomes loud, although later onsets are sharper.
-TEST(Beats, PowerRiseForcesABeat) {
-    std::mt19937 random(9);
-    std::vector<double> song(90 * 11025);
-    for (size_t i = 0; i < song.size(); ++i) {
-        const bool silent = i % 5512 > 3000 && i % 5512 < 3700;
-        song[i] = (i < 50 * 11025 ? 2000.0 : silent ? 0.0 : 16000.0) * uniform(&random);
-    }
-    analysis run(song);
-    EXPECT_GT(getBeatPosition(&run.ctx), 1);
-    run.ctx.onset->max_beats = 1;
-    ASSERT_EQ(getBeatPosition(&run.ctx), 1);
-    EXPECT_NEAR(run.ctx.onset->beat_times[0], 50000.0, 100.0);
-}
-
 TEST(Beats, StopIsCheckedBeforeTheEnvelopeAndAfterTheTempo) {
     for (const auto &[start, tempo, beats] :
          {std::tuple{0, false, false}, {1, true, false}, {5, true, true}}) {
