@@ -220,7 +220,7 @@ function update() {
   byId("play").textContent = playing ? "Pause" : "Play";
   byId("play").ariaPressed = playing;
   const second = String(Math.floor(now / 1000));
-  if (timeline.ariaValueNow !== second) {
+  if (!playing || timeline.ariaValueNow !== second) {  // a screen reader speaks at most once a second
     timeline.ariaValueNow = second;
     timeline.ariaValueText = clock(now);
   }

@@ -69,19 +69,18 @@ class Report(Browser):
         first, second, *_ = (ms for ms in result["beats_ms"] if ms > start + 30)
         for button, ms in (("gohl", start), ("next", first), ("next", second), ("prev", first)):
             self.click(button)
-            self.wait(f"Math.abs(player.now() - {ms}) < 1")
+            self.wait(f"Math.abs(player.now() - {ms}) < 1 && timeline.ariaValueText === clock({ms})")
         self.script("seek(arguments[0])", result["hl_end_ms"] - 200)
         self.click("loop", "play")
         self.wait(f"player.now() < {start + 3000}")  # the loop started again
         self.wait("scheduled.length > 0")  # clicks
         self.click("play")
 
-        (timeline,) = self.find("#timeline")
-        webdriver.ActionChains(self.browser).move_to_element(timeline).click().perform()
+        self.click("timeline")
         self.wait("Math.abs(player.now() - songEnd / 2) < songEnd / 100")
         self.click("tobeat")
         self.assertAlmostEqual(self.script("return view.span"), 2000, delta=1)
-        timeline.send_keys("0")
+        self.find("#timeline")[0].send_keys("0")
         self.assertTrue(self.script("return view.from === 0 && view.span === songEnd"))
         self.find("#beattimes button")[0].click()
         self.wait("Math.abs(player.now() - beats[0]) < 1")
