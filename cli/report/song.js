@@ -4,7 +4,7 @@ const beats = song.beats_ms || [];
 const soundStart = -song.offset_ms;
 const songEnd = Math.max(soundStart + song.read_ms, song.hl_pos_ms || 0, ...beats.slice(-1));
 const hasHighlight = song.hl_pos_ms !== undefined;
-const loopEnd = Math.min(song.region_end_ms, songEnd - 100);  // before the end, where playing stops
+const loopEnd = Math.min(song.region_end_ms, songEnd);
 const timeline = byId("timeline");
 const svg = timeline.querySelector("svg");
 const view = { from: 0, span: songEnd };
@@ -115,6 +115,7 @@ const linked = {
   pause: () => audio.pause(),
   seek: (ms) => { audio.currentTime = ms / 1000; },
   now: () => audio.currentTime * 1000,
+  ended: () => audio.ended,
   playing: () => !audio.paused && !audio.ended,
 };
 
@@ -149,7 +150,8 @@ const embedded = {
     const seconds = this.node ? this.offset + context.currentTime - this.started : this.offset;
     return Math.min(1000 * seconds, this.buffer ? 1000 * this.buffer.duration : songEnd);
   },
-  playing() { return this.node !== null && this.now() < 1000 * this.buffer.duration; },
+  ended() { return this.node !== null && this.now() >= 1000 * this.buffer.duration; },
+  playing() { return this.node !== null && !this.ended(); },
 };
 const player = song.embedded ? embedded : linked;
 if (!song.embedded) audio.src = song.audio;
@@ -210,8 +212,12 @@ function seek(ms) {
 // ---- Following the playback.
 
 function update() {
-  const now = player.now(), playing = player.playing();
-  if (playing && pressed("loop") && now >= loopEnd) return seek(song.hl_pos_ms);
+  const now = player.now(), playing = player.playing(), ended = player.ended();
+  if (pressed("loop") && (playing && now >= loopEnd || ended && pressed("play"))) {
+    seek(song.hl_pos_ms);
+    if (ended) player.play();
+    return;
+  }
   if (playing && pressed("clicks")) addClicks(now);
   const isOutside = now < view.from || now > view.from + view.span;
   if (playing && pressed("follow") && isOutside) show(now - view.span / 10, view.span);
