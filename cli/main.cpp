@@ -35,20 +35,19 @@ struct run_state {
 };
 
 void accept_result(run_state &state, input &&done, reply &&answer) {
-    if (done.stored.empty()) {
-        report_failure(state.output,
-                       add_song(state.db, {done.path, done.file, std::move(answer.json), {}}));
+    const size_t index = done.index;
+    if (!state.opts.from_store) {
+        done.stored = std::move(answer.json);
+        report_failure(state.output, add_song(state.db, std::move(done)));
     }
-    accept_reply(state.output, done.index, std::move(answer));
+    accept_reply(state.output, index, std::move(answer));
 }
 
 // Finds the next input from the command line or the store.
 supply_state find_next(run_state &state, input &next) {
     if (!state.opts.from_store) return next_input(state.supply, next);
-    stored_song song;
     bool found = false;
-    report_failure(state.output, read_next(state.db, song, found));
-    next = {song.path, song.damage, song.result};
+    report_failure(state.output, read_next(state.db, next, found));
     return found ? supply_state::ready : supply_state::ended;
 }
 
@@ -57,7 +56,7 @@ bool is_wanted(run_state &state, input &next) {
     if (!in_shard(state.opts.share, next.path)) return false;
     if (state.opts.from_store || next.refusal) return true;
     bool is_new = true;
-    report_failure(state.output, find_song(state.db, next.path, next.file, is_new));
+    report_failure(state.output, find_song(state.db, next, is_new));
     return is_new;
 }
 

@@ -3,6 +3,7 @@
 // Input: the files, folders and lists in the options. Output: one input per file. Used by main.cpp.
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <set>
 #include <string>
@@ -10,14 +11,19 @@
 
 #include "cli/failure.h"
 #include "cli/options.h"
-#include "cli/store/store.h"
+
+// Distinguishes a file from a later version of it.
+struct file_state {
+    int64_t size = 0;      // bytes
+    int64_t mtime_ns = 0;  // last change, since 1970
+};
 
 // An input, from its discovery to its result.
 struct input {
     std::string path = {};    // any bytes except NUL
-    failure refusal = {};     // set if the input is already known to be unusable
-    std::string stored = {};  // the result as JSON, if the store has it; otherwise empty
-    file_state file = {};     // for the store
+    failure refusal = {};     // set if the input, or its row in the store, cannot be used
+    std::string stored = {};  // the result in the store, as JSON; empty if it has none yet
+    file_state file = {};     // before the analysis, for the store
     uint64_t index = 0;       // number of earlier inputs
 };
 

@@ -111,9 +111,9 @@ cell cell_of(const json &value) {
 }
 
 // Returns the cells of a row after its key, except the time.
-row cells_of(const stored_song &song) {
+row cells_of(const input &song) {
     row cells = {std::to_string(song.file.size), std::to_string(song.file.mtime_ns)};
-    const json result = json::parse(song.result);
+    const json result = json::parse(song.stored);
     for (const result_column &column : kResultColumns) {
         cells.push_back(cell_of(result.value(column.key, json())));
     }
@@ -132,18 +132,18 @@ bool read_value(const std::string &text, const result_column &column, json &valu
 }
 
 // Converts a row of page_query to a song. Its result lacks the file's name.
-stored_song song_of(const row &cells, int32_t mode) {
-    stored_song song;
+input song_of(const row &cells, int32_t mode) {
+    input song;
     song.path = cells[0].value_or("");
     json object = {{"mode", mode_word(mode)}};
     for (size_t i = 1; i < cells.size(); ++i) {
         const result_column &column = kResultColumns[i - 1];
         if (!cells[i] || read_value(*cells[i], column, object[column.key])) continue;
-        song.damage = {std::string("Its row in the store is damaged: ") + column.name +
-                       " cannot be read."};
+        song.refusal = {std::string("Its row in the store is damaged: ") + column.name +
+                        " cannot be read."};
         return song;
     }
-    song.result = object.dump();
+    song.stored = object.dump();
     return song;
 }
 
@@ -236,7 +236,7 @@ failure commit_batch(store &db) {
     const auto write_rows = [&]() -> failure {
         if (failure failed = db.run("BEGIN", {}, nullptr)) return failed;
         const std::string sql = put_statement();
-        for (const stored_song &song : db.batch) {
+        for (const input &song : db.batch) {
             const row values = values_of(db, song.path, cells_of(song));
             if (failure failed = db.run(sql, values, nullptr)) return failed;
         }
@@ -259,16 +259,16 @@ failure open_store(store &db, const options &opts) {
     return failed;
 }
 
-failure find_song(store &db, const std::string &path, file_state &file, bool &is_new) {
+failure find_song(store &db, input &song, bool &is_new) {
     is_new = true;
     struct stat info {};
-    if (db.kind == nullptr || db.has_failed || stat(path.c_str(), &info) != 0) return {};
-    file.size = info.st_size;
-    file.mtime_ns = int64_t{info.st_mtim.tv_sec} * 1'000'000'000 + info.st_mtim.tv_nsec;
+    if (db.kind == nullptr || db.has_failed || stat(song.path.c_str(), &info) != 0) return {};
+    song.file.size = info.st_size;
+    song.file.mtime_ns = int64_t{info.st_mtim.tv_sec} * 1'000'000'000 + info.st_mtim.tv_nsec;
     if (db.opts.redo) return {};
     std::string status;
-    const row values =
-        values_of(db, path, {std::to_string(file.size), std::to_string(file.mtime_ns)});
+    const row values = values_of(
+        db, song.path, {std::to_string(song.file.size), std::to_string(song.file.mtime_ns)});
     failure failed = persist(db, [&] {
         return db.run(kStatusQuery, values,
                       [&](const row &cells) { status = cells[0].value_or(""); });
@@ -280,8 +280,8 @@ failure find_song(store &db, const std::string &path, file_state &file, bool &is
     return failed;
 }
 
-failure add_song(store &db, stored_song &&song) {
-    if (db.kind == nullptr || song.result.empty()) return {};
+failure add_song(store &db, input &&song) {
+    if (db.kind == nullptr || song.stored.empty()) return {};
     if (song.path.size() > kLongestPath) {
         return {shown(song.path) + ": the name is too long for the store."};
     }
@@ -294,7 +294,7 @@ failure commit_old_batch(store &db) {
     return steady_clock::now() - db.batch_since < kBatchAge ? failure() : commit_batch(db);
 }
 
-failure read_next(store &db, stored_song &song, bool &found) {
+failure read_next(store &db, input &song, bool &found) {
     found = false;
     if (db.page.empty()) {
         const row values = values_of(db, db.last_path, {db.opts.failed ? "failed" : "ok"});
@@ -316,7 +316,7 @@ failure read_next(store &db, stored_song &song, bool &found) {
 failure close_store(store &db, std::string &summary) {
     if (db.kind == nullptr) return {};
     failure failed = commit_batch(db);
-    for (const stored_song &song : db.batch) write_all(STDOUT_FILENO, song.result);
+    for (const input &song : db.batch) write_all(STDOUT_FILENO, song.stored);
     if ((db.opts.quiet || db.opts.from_store) && db.batch.empty()) return failed;
     summary = "tavo: " + std::to_string(db.stored) + " stored";
     if (db.known > 0) summary += ", " + std::to_string(db.known) + " known already";
