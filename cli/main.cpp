@@ -109,7 +109,9 @@ int analyse_inputs(const options &opts) {
         accept_result(state, std::move(done), std::move(answer));
     };
     state.pool.on_bad_end = [&](const failure &failed) { report_failure(state.output, failed); };
-    if (report_failure(state.output, open_store(state.db, opts))) return kExitFailed;
+    if (report_failure(state.output, open_store(state.db, opts))) {
+        return stop_signal() != 0 ? kExitSignal + stop_signal() : kExitFailed;
+    }
     if (report_failure(state.output, start_output(state.output, opts))) return kExitFailed;
     while (true) {
         search_inputs(state);
