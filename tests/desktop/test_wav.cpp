@@ -76,7 +76,7 @@ TEST(Wav, ReadsTheEndOfLargeFiles) {
         const std::string path =
             save("sparse.wav", patch(last.substr(0, kData + 8), kData + 4, uint64_t(size), 4));
         std::fstream out(path, std::ios::in | std::ios::out | std::ios::binary);
-        out.seekp(kData + 8 + (seconds - 1) * kSecondBytes) << last.substr(kData + 8);
+        out.seekp(int64_t{kData} + 8 + (seconds - 1) * kSecondBytes) << last.substr(kData + 8);
         ASSERT_TRUE(out.flush().good());
         const open_source file(path);
         ASSERT_NE(file.source, nullptr) << file.error;

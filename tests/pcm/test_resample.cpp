@@ -152,7 +152,7 @@ signal_run convert_in_place(int16_t *pcm, size_t bytes, int32_t rate) {
 TEST(ResampleRun, InPlaceConversionIsBitIdentical) {
     const std::string bytes = noise(40'003, 5);
     for (const int32_t rate : {8000, 11025, 33075, 44100, 48000, 96000}) {
-        for (const size_t size : {40'003, 40'002, 36'003, 2, 0}) {
+        for (const size_t size : {40'003u, 40'002u, 36'003u, 2u, 0u}) {
             SCOPED_TRACE(testing::Message() << size << " bytes at " << rate);
             auto *pcm = static_cast<int16_t *>(malloc(size));
             memcpy(pcm, bytes.data(), size);
