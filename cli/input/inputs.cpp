@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <strings.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -18,7 +19,6 @@
 #include "cli/input/song_file.h"
 #include "cli/system.h"
 #include "cli/write/markers.h"
-#include "cli/write/output_file.h"
 #include "cli/write/sound_files.h"
 #include "cli/write/value_text.h"
 #include "include/tavo.h"
@@ -42,6 +42,13 @@ void add_note(input_supply &supply, const std::string &sentence) {
     supply.notes += "tavo: " + sentence + "\n";
 }
 
+// Returns a text that is the same for all paths of a file or folder.
+std::string id_of(const std::string &path) {
+    struct stat info {};
+    if (stat(path.c_str(), &info) != 0) return path;
+    return std::to_string(info.st_dev) + ":" + std::to_string(info.st_ino) + "/";
+}
+
 // Claims the marker file or clip of an input, so that no other input writes the same file. Returns
 // false if the input must be skipped.
 bool claim_target(input_supply &supply, input &entry, const std::string &target) {
@@ -50,12 +57,11 @@ bool claim_target(input_supply &supply, input &entry, const std::string &target)
         ++supply.existing;
         return false;
     }
-    const fs::path place = fs::weakly_canonical(fs::absolute(target), failed);
-    // A failure is reported when the file is read or written.
-    if (failed || !fs::exists(entry.path, failed)) return true;
-    const auto [claim, is_first] = supply.targets.emplace(place, entry.path);
+    if (!fs::exists(entry.path, failed)) return true;  // reported when the file is read
+    const std::string place = id_of(fs::path(target).parent_path() / ".") + base_name(target);
+    const auto [claim, is_first] = supply.targets.emplace(place, id_of(entry.path));
     if (is_first) return true;
-    if (same_file(claim->second, entry.path)) {
+    if (claim->second == id_of(entry.path)) {
         add_note(supply, shown(entry.path) + ": named more than once, done once.");
         return false;
     }
@@ -73,9 +79,8 @@ bool claim_targets(input_supply &supply, input &entry) {
 
 // Adds the entries of a folder, unless this search has already entered it through another link.
 failure enter_folder(input_supply &supply, const std::string &path) {
+    if (!supply.searched.insert(id_of(path)).second) return {};
     std::error_code code;
-    const fs::path folder = fs::canonical(path, code);
-    if (!code && !supply.searched.insert(folder).second) return {};
     std::vector<std::string> entries;
     fs::directory_iterator entry(path, code);
     for (; !code && entry != fs::directory_iterator(); entry.increment(code)) {
@@ -130,8 +135,7 @@ failure cannot_read_list(int code) {
 // Refuses NUL bytes without -0, and a song passed by mistake, which would yield thousands of names.
 failure check_start(const std::string &text, char separator) {
     if (recognise_bytes(text) != file_kind::unknown) {
-        return {
-            "This is sound, not a list of names; name it as FILE, which is /dev/stdin for a pipe."};
+        return {"This is sound, not a list of names; name it as FILE (/dev/stdin for a pipe)."};
     }
     if (separator != '\0' && text.find('\0') != std::string::npos) {
         return {"The list holds NUL bytes: give -0 when its names end with them."};

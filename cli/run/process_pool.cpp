@@ -171,9 +171,7 @@ void read_from(process_pool &pool, worker_process &worker) {
 
 bool assign(process_pool &pool, input &next) {
     // An idle worker that is running comes before one that must be started.
-    const auto rank = [](const worker_process &each) {
-        return each.current ? 2 : each.pid < 0 ? 1 : 0;
-    };
+    const auto rank = [](const auto &each) { return each.current ? 2 : each.pid < 0 ? 1 : 0; };
     const auto worker =
         std::min_element(pool.workers.begin(), pool.workers.end(),
                          [&](const auto &a, const auto &b) { return rank(a) < rank(b); });
