@@ -104,6 +104,7 @@ failure begin_report_index(output_file &index, const options &opts) {
     if (failure failed = check_report(opts.report, opts.force)) return failed;
     const std::string folder = pages_folder(opts);
     std::error_code code;
+    if (fs::is_symlink(folder, code)) return {"The folder " + shown(folder) + " is a link."};
     fs::create_directory(folder, code);
     if (code) {
         return {system_sentence("The folder " + shown(folder) + " cannot be made", code.value())};
