@@ -43,11 +43,11 @@ struct input_supply {
     name_list list = {};                    // list that is being read
     std::string folder = {};                // folder that is being searched, or empty
     std::vector<std::string> entries = {};  // entries of the folder not yet examined, last first
-    std::set<std::string> searched = {};    // the folder and its searched subfolders
+    std::set<std::string> searched = {};    // ids of the folder and its searched subfolders
     size_t found = 0;                       // audio files found in the folder
     size_t skipped = 0;                     // other files found in the folder
     size_t existing = 0;                    // inputs left out by --skip-existing
-    std::map<std::string, std::string> targets = {};  // marker files and clips, and their inputs
+    std::map<std::string, std::string> targets = {};  // ids of output files and their inputs
     std::string notes = {};                           // lines for standard error
 };
 
