@@ -46,9 +46,11 @@ failure run(const database &db, const std::string &sql, const row &values,
         if (code != SQLITE_ROW || !on_row) continue;
         row found;
         for (int i = 0; i < sqlite3_column_count(statement); ++i) {
-            const auto *text = reinterpret_cast<const char *>(sqlite3_column_text(statement, i));
+            const bool is_path = sqlite3_column_type(statement, i) == SQLITE_BLOB;
+            const auto *bytes = static_cast<const char *>(
+                is_path ? sqlite3_column_blob(statement, i) : sqlite3_column_text(statement, i));
             const auto size = static_cast<size_t>(sqlite3_column_bytes(statement, i));
-            found.push_back(text == nullptr ? cell() : std::string(text, size));
+            found.push_back(bytes == nullptr ? cell() : std::string(bytes, size));
         }
         on_row(found);
     }
