@@ -154,10 +154,16 @@ TEST(Valleys, AreTheEndsOfQuietStretches) {
 // Edges are steep rises. Those in the first 18 s and the last 50 s of a song are ignored. In a song
 // shorter than 90 s, only those in the last 20 s are ignored.
 TEST(Search, ReturnsTheBestEdge) {
+    // This curve has two loud passages. The second one, of 20 points, is chosen.
+    const char *plain = "10 0.25 4 0.75 16 0.25 20 1 10 0.25";
+    // A region that would extend past the song starts at the first passage or valley instead.
+    const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
+    const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
     const struct {
         const char *curve;
         int32_t duration_s;
         uint32_t ms;
+        int32_t requested_s = 0;  // length of the highlight
     } cases[] = {
         {"20 0.4 10 0.9 1 1 19 0.9 10 0.4", 120, 38000},
         // Of two edges with equal scores the larger step wins.
@@ -188,8 +194,19 @@ TEST(Search, ReturnsTheBestEdge) {
         // After the opening there must be at least five points.
         {"11 0.25 2 1", 100, 0},
         {"12 0.25 2 1", 100, 24000},
+        // A requested length moves the start.
+        {plain, 120, 58000, 46},  // the start is still the nearest boundary
+        {plain, 120, 26000, 60},  // the nearest boundary is the end of the first passage
+        {plain, 120, 18000, 104},
+        {segment_first, 120, 18000, 102},
+        {valley_only, 120, 62000, 58},
+        // A passage consists of at least two loud points.
+        {"20 0.5 1 1 39 0.5", 120, 24000, 30},
+        {"20 0.5 2 1 38 0.5", 120, 38000, 30},
     };
-    for (const auto &c : cases) EXPECT_EQ(search(c.curve, c.duration_s), c.ms) << c.curve;
+    for (const auto &c : cases) {
+        EXPECT_EQ(search(c.curve, c.duration_s, c.requested_s), c.ms) << c.curve;
+    }
 }
 
 // Only the ten largest edges are compared, so a passage after nine bursts is found, but one after
@@ -201,30 +218,6 @@ TEST(Search, ComparesTenEdgesAndThirtyPassages) {
     EXPECT_EQ(search(bursts + " 1 1 4 0.25 10 0.6 30 0.25", 210), 2000u * 57);
     for (int k = 0; k < 29; ++k) passages += "4 0.25 6 0.75 ";
     EXPECT_EQ(search(passages + "4 0.25 6 1 30 0.25", 660), 2000u * 293u);
-}
-
-TEST(Search, RequestedLengthMovesTheStart) {
-    // This curve has two loud passages. The second one, of 20 points, is chosen.
-    const char *plain = "10 0.25 4 0.75 16 0.25 20 1 10 0.25";
-    // A region that would extend past the song starts at the first passage or valley instead.
-    const char *segment_first = "10 0.5 20 1 9 0.5 1 0.1 20 0.5";
-    const char *valley_only = "20 0.5 1 1 10 0.5 1 0.1 28 0.5";
-    // A passage consists of at least two loud points.
-    const char *one = "20 0.5 1 1 39 0.5", *two = "20 0.5 2 1 38 0.5";
-    const struct {
-        const char *curve;
-        int32_t hl_param;
-        uint32_t ms;
-    } cases[] = {
-        {plain, 46, 58000},  // the start is still the nearest boundary
-        {plain, 60, 26000},  // the nearest boundary is the end of the first passage
-        {plain, 104, 18000},      {segment_first, 102, 18000},
-        {valley_only, 58, 62000}, {one, 30, 24000},
-        {two, 30, 38000},
-    };
-    for (const auto &c : cases) {
-        EXPECT_EQ(search(c.curve, 120, c.hl_param), c.ms) << c.curve << ", " << c.hl_param;
-    }
 }
 
 // The ideal start is the requested length before the end of the region. The mean is 0.5.
