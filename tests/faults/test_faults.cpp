@@ -55,7 +55,7 @@ outcome run(const std::string &path, int mode, const fault::plan &plan) {
     fault::arm(plan);
     TAVO_CTX *ctx = job::create(path, std::max(mode, 0), &out.created);
     if (ctx != nullptr) {
-        out.failed_early = fault::failed_calls();
+        out.failed_early = fault::failed_calls;
         out.song_ms = static_cast<double>(ctx->duration) / kUnitsPerMs;
         fnamedec = click.path.c_str();
         out.started = mode == kOpenedOnly ? 1 : tavo_analyze(ctx, 0, 0, 0);
@@ -64,8 +64,8 @@ outcome run(const std::string &path, int mode, const fault::plan &plan) {
         out.complete = tavo_is_complete(ctx);
         out.released = tavo_deinit(ctx);
     }
-    out.counted = fault::counted_calls();
-    out.failed = fault::failed_calls();
+    out.counted = fault::counted_calls;
+    out.failed = fault::failed_calls;
     fault::disarm();
     alarm(0);
     out.result = job::last;

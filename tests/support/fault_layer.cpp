@@ -4,40 +4,28 @@
 #include <sys/types.h>
 #include <unistd.h>
 
-#include <atomic>
 #include <cstdio>
 
 namespace {
 
 fault::plan current;
-std::atomic<int64_t> count, failed;
 
 bool must_fail(uint32_t call) {
     if ((current.calls & call) == 0) return false;
     if (current.on_call != nullptr) current.on_call();
-    const int64_t index = count++;
+    const int64_t index = fault::counted_calls++;
     if (index < current.index || (index > current.index && !current.forever)) return false;
-    ++failed;
+    ++fault::failed_calls;
     errno = current.error;
     return true;
 }
 
 }  // namespace
 
-namespace fault {
-
-void arm(const plan &next) {
-    count = failed = 0;
+void fault::arm(const plan &next) {
+    counted_calls = failed_calls = 0;
     current = next;
 }
-int64_t counted_calls() {
-    return count;
-}
-int64_t failed_calls() {
-    return failed;
-}
-
-}  // namespace fault
 
 #define WRAP(call, type, name, parameters, arguments, failure)             \
     extern "C" type __real_##name parameters;                              \

@@ -2,6 +2,7 @@
 // the library's objects, because the linker cannot replace the calls in libtavo.so.
 #pragma once
 
+#include <atomic>
 #include <cerrno>
 #include <cstdint>
 
@@ -39,7 +40,6 @@ inline void disarm() {
     arm({});
 }
 
-int64_t counted_calls();  // counted calls since arm
-int64_t failed_calls();   // failed calls since arm
+inline std::atomic<int64_t> counted_calls, failed_calls;  // since arm
 
 }  // namespace fault
