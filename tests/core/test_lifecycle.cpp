@@ -12,10 +12,8 @@
 
 namespace {
 
-using core_song::for_each_mode;
-using core_song::kModes;
-
-TEST(Lifecycle, InitCreatesTheContextsOfTheMode) {
+// The listener replaces the callback.
+TEST(Lifecycle, InstanceHasTheContextsOfItsModeAndCallsItsListener) {
     for_each_mode(kModes, [](int32_t mode, TAVO_CTX *ctx) {
         EXPECT_EQ(memcmp(ctx, "ZEKA", 4), 0);
         EXPECT_EQ(ctx->state, 1);
@@ -31,23 +29,31 @@ TEST(Lifecycle, InitCreatesTheContextsOfTheMode) {
         EXPECT_TRUE(tavo_has_audio(ctx) == 0 && tavo_is_complete(ctx) == 0);
         EXPECT_EQ(_tavo_quit(ctx), 0);  // no job to stop
         EXPECT_EQ(ctx->quit, 0);
+
+        std::atomic<int> calls{0};
+        const auto count = [](TAVO_INFO *info, void *user) {
+            *static_cast<std::atomic<int> *>(user) += info->status == 0 ? 1 : 100;
+        };
+        EXPECT_EQ(tavo_set_listener(ctx, count, &calls), 0);
+        EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
+        while (!has_ended(ctx)) std::this_thread::yield();
         EXPECT_EQ(tavo_deinit(ctx), 0);
-        EXPECT_EQ(job::last.calls, 0);
+        EXPECT_TRUE(calls == 1 && job::last.calls == 0);
     });
 }
 
 TEST(Probe, ReportsTheStreamOrWhyTheFileIsRefused) {
-    const core_song::file short_song(support::make_song({8000, 1, 1.0, 120.0, 1, 0.0}));
-    const core_song::file low_rate(support::make_song({7999, 2, 2.0, 120.0, 1, 0.0}));
+    const song_file short_song(support::make_song({8000, 1, 1.0, 120.0, 1, 0.0}));
+    const song_file low_rate(support::make_song({7999, 2, 2.0, 120.0, 1, 0.0}));
     const struct {
         std::string path;
         int32_t code;
         TAVO_STREAM stream;
     } cases[] = {
-        {core_song::whole().path, TAVO_OK, {22050, 1, 100'000}},
+        {whole_song().path, TAVO_OK, {22050, 1, 100'000}},
         {short_song.path, TAVO_ERR_SHORT, {8000, 1, 1000}},
         {low_rate.path, TAVO_ERR_LOW_RATE, {7999, 2, 2000}},
-        {core_song::whole().path + ".missing", TAVO_ERR_OPEN, {}},
+        {whole_song().path + ".missing", TAVO_ERR_OPEN, {}},
         {testing::TempDir(), TAVO_ERR_READ, {}},
         {std::string(TAVO_PATH_BYTES, 'x'), TAVO_ERR_FORMAT, {}},
     };
@@ -61,20 +67,6 @@ TEST(Probe, ReportsTheStreamOrWhyTheFileIsRefused) {
         EXPECT_STRNE(tavo_error_text(row.code), tavo_error_text(1));
     }
     EXPECT_EQ(tavo_probe(nullptr, nullptr), TAVO_ERR_HANDLE);
-}
-
-TEST(Listener, IsCalledOnceWithTheHostsPointerInsteadOfTheCallback) {
-    for_each_mode(kModes, [](int32_t, TAVO_CTX *ctx) {
-        std::atomic<int> calls{0};
-        const auto count = [](TAVO_INFO *info, void *user) {
-            *static_cast<std::atomic<int> *>(user) += info->status == 0 ? 1 : 100;
-        };
-        EXPECT_EQ(tavo_set_listener(ctx, count, &calls), 0);
-        EXPECT_EQ(tavo_analyze(ctx, 0, 0, 0), 0);
-        while (!has_ended(ctx)) std::this_thread::yield();
-        EXPECT_EQ(tavo_deinit(ctx), 0);
-        EXPECT_TRUE(calls == 1 && job::last.calls == 0);
-    });
 }
 
 TEST(Lifecycle, BadHandlesChangeNothing) {

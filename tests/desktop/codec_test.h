@@ -14,8 +14,6 @@
 #include "media_source/wexaaudio.h"
 #include "tests/support/bytes.h"
 
-namespace codec_test {
-
 using samples = std::vector<int16_t>;
 
 constexpr int64_t kUnits = 10'000'000;  // per second
@@ -54,7 +52,6 @@ struct open_source {
     }
     ~open_source() { EXPECT_TRUE(source == nullptr || mtsrc_deinit(source) == -5); }
     open_source(const open_source &) = delete;
-    open_source &operator=(const open_source &) = delete;
 };
 
 // Reads at most `limit` samples from the current position. The test fails if a read fails.
@@ -92,5 +89,3 @@ inline mtsrc_io io_for(const std::string &path) {
     io.path = const_cast<char *>(path.c_str());  // only open() uses it, without writing
     return io;
 }
-
-}  // namespace codec_test

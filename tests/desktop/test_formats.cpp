@@ -5,7 +5,6 @@
 #include "pcm/decode.h"
 #include "tests/desktop/codec_test.h"
 
-namespace codec_test {
 namespace {
 
 using namespace std::string_literals;
@@ -110,11 +109,6 @@ TEST(Reader, DecodesTheSameSamplesFromEveryContainer) {
                      {reference.begin() + static_cast<ptrdiff_t>(pair.front),
                       reference.end() - static_cast<ptrdiff_t>(pair.end)});
     }
-    // The MPEG source drops the first 529 samples of a stereo stream at 44.1 kHz, but at most one
-    // frame (384 samples in Layer I). The MP4 source drops none.
-    EXPECT_EQ(read_all(fixture("stereo3.mp4")).size(), read_all(fixture("cbr.mp3")).size() + 529);
-    EXPECT_EQ(read_all(fixture("golden/layer1_44.mp1")).size(), 19U * 384);
-    EXPECT_EQ(read_all(fixture("golden/layer1_48.mp1")).size(), 20U * 384);
 }
 
 // Returns ffmpeg's downmix of a song, rounded to 16 bits.
@@ -151,6 +145,8 @@ TEST(Reader, AgreesWithFfmpeg) {
         {"cbr48.mp3", "cbr48.mp3", "<c0+c1"},
         {"low.mp3", "low.mp3", "=c0"},
         {"layer2.mp2", "layer2.mp2", "<c0+c1", 2, 529},
+        {"golden/layer1_44.mp1", "golden/layer1_44.mp1", "<c0+c1", 2, 384},  // one frame
+        {"golden/layer1_48.mp1", "golden/layer1_48.mp1", "<c0+c1", 2},
         {"song.ogg", "song.ogg", "<c0+c1"},
         {"six.ogg", "six.ogg", "<c0+c1+c2+c3+c4+c5"},
     };
@@ -234,4 +230,3 @@ TEST(Reader, SkipsTagsAndGarbage) {
 }
 
 }  // namespace
-}  // namespace codec_test

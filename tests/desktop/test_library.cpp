@@ -6,7 +6,6 @@
 
 #include "tests/desktop/codec_test.h"
 
-namespace codec_test {
 namespace {
 
 using namespace std::string_literals;
@@ -93,4 +92,3 @@ TEST(ScanCache, ScansAFileOnce) {
 }
 
 }  // namespace
-}  // namespace codec_test

@@ -1,7 +1,6 @@
 #include "tests/desktop/codec_test.h"
 #include "tests/support/song.h"
 
-namespace codec_test {
 namespace {
 
 using namespace std::string_literals;
@@ -89,4 +88,3 @@ TEST(Wav, ReadsTheEndOfLargeFiles) {
 }
 
 }  // namespace
-}  // namespace codec_test
