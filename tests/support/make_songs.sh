@@ -25,8 +25,6 @@ cd "$out/codec"
 "$make_song" song.wav --seconds 12
 "$make_song" mono.wav --seconds 12 --channels 1
 "$make_song" song48.wav --seconds 12 --rate 48000
-"$make_song" song22.wav --seconds 12 --rate 22050
-"$make_song" song96.wav --seconds 6 --rate 96000
 "$make_song" six.wav --seconds 6 --channels 6
 
 lame --quiet -b 128 -t song.wav cbr.mp3
@@ -35,7 +33,7 @@ lame --quiet -V 2 song.wav vbr.mp3
 lame --quiet -V 2 -t song.wav vbr_no_table.mp3
 lame --quiet -b 96 -p -t song.wav checked.mp3
 lame --quiet -b 64 -m m -t mono.wav mono.mp3
-lame --quiet -b 56 -t song22.wav lsf.mp3
+lame --quiet -b 56 --resample 22.05 -t song.wav lsf.mp3
 lame --quiet -b 8 -m m --resample 8 -t song.wav low.mp3
 convert song.wav layer2.mp2 -c:a mp2 -b:a 192k
 
@@ -43,7 +41,7 @@ flac --totally-silent -5 -o song.flac song.wav
 flac --totally-silent -5 --no-seektable -T 'TITLE=A Title' -o no_table.flac song.wav
 flac --totally-silent -5 -o mono.flac mono.wav
 flac --totally-silent -5 --channel-map=none -o six.flac six.wav
-convert song96.wav wide.wav -c:a pcm_s24le -af 'volume=0.77'
+convert song.wav wide.wav -c:a pcm_s24le -ar 96000 -af 'volume=0.77' -t 6
 flac --totally-silent -5 -o wide.flac wide.wav
 convert song.wav noise.wav -c:a pcm_s24le -af 'aeval=random(0)*1.8-0.9|random(1)*1.8-0.9' -t 6
 flac --totally-silent --lax -0 -b 65535 -o noise.flac noise.wav

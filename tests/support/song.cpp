@@ -24,7 +24,6 @@ constexpr double kAccentSeconds = 0.3;
 constexpr double kAccent = 1.35;
 constexpr double kSwellSeconds = 4.0;
 constexpr double kSwell = 0.15;
-constexpr double kFadeSeconds = 0.01;  // duration of each change of the bed's gain
 // Each chord consists of the second, third and fourth harmonics of its root, so the bed's spectrum
 // keeps its shape.
 constexpr double kRootHz[4] = {110.0, 123.47, 98.0, 130.81};
@@ -46,13 +45,6 @@ double bed_gain_at(const song_spec &plan, double t) {
     return gain_at(plan, t) * (accent ? kAccent : 1.0);
 }
 
-// Returns the bed's gain, with each step split into four smaller ones within kFadeSeconds.
-double faded_bed_gain_at(const song_spec &plan, double t) {
-    double sum = 0.0;
-    for (int k = 0; k < 4; ++k) sum += bed_gain_at(plan, t - kFadeSeconds * k / 4.0);
-    return sum / 4.0;
-}
-
 // Adds the bed. Saturation gives the bed the loudness-to-peak ratio of recorded music.
 void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
     std::mt19937 random = numbers_for(plan, 100);
@@ -68,7 +60,7 @@ void add_bed(const song_spec &plan, int32_t channel, std::vector<double> &out) {
         phase += kTwoPi * kRootHz[static_cast<size_t>(std::fmax(chord, 0.0)) % 4] / plan.rate;
         const double sum = std::sin(2.0 * phase) + std::sin(3.0 * phase + offset[0]) +
                            std::sin(4.0 * phase + offset[1]);
-        out[i] += level * faded_bed_gain_at(plan, t) * std::tanh(sum) + kFloor * uniform(&floor);
+        out[i] += level * bed_gain_at(plan, t) * std::tanh(sum) + kFloor * uniform(&floor);
     }
 }
 
