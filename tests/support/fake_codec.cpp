@@ -311,10 +311,10 @@ int32_t xoggds_get_format(void *stream, void *buf, int32_t *length) {
     find_object(stream);
     const int32_t result = next_result(0);
     if (result != 0) return result;
-    const stream_spec &spec = state.streams.back();
-    const auto size = static_cast<int32_t>(spec.setup.size());
-    if (buf) memcpy(buf, spec.setup.data(), static_cast<size_t>(std::clamp(*length, 0, size)));
-    *length = buf ? size : spec.setup_length.value_or(size);
+    const stream_spec &described = state.streams.back();
+    const auto size = static_cast<int32_t>(described.setup.size());
+    if (buf) memcpy(buf, described.setup.data(), static_cast<size_t>(std::clamp(*length, 0, size)));
+    *length = buf ? size : described.setup_length.value_or(size);
     return 0;
 }
 }
