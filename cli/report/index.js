@@ -31,7 +31,7 @@ function sortBy(column) {
     if (p === undefined || q === undefined) return (p === undefined) - (q === undefined);  // missing values last
     return sign * (column === 0 ? order.compare(p, q) : p - q);
   });
-  body.append(...songs.map((song) => song.row));
+  for (const { row } of songs) body.append(row);
 }
 
 function search(words) {

@@ -25,7 +25,7 @@ function drawLoudness() {
   const top = Math.max(...song.loudness, 1e-9);
   const y = (value) => 79 - value / top * 29;
   // Each value is drawn in the middle of its 6-second window.
-  draw("loud", ...song.loudness.map((value, k) => [soundStart + 2000 * k + 3000, y(value)]));
+  drawLine("loud", song.loudness.map((value, k) => [soundStart + 2000 * k + 3000, y(value)]), svg);
   const mean = y(song.loudness.reduce((sum, value) => sum + value) / song.loudness.length);
   draw("mean", [0, mean], [songEnd, mean]);
 }
@@ -45,13 +45,13 @@ function drawTicks() {
   const steps = [100, 200, 500, 1e3, 2e3, 5e3, 1e4, 15e3, 3e4, 6e4, 12e4, 3e5, 6e5, 9e5, 18e5, 36e5, 72e5];
   const most = Math.max(2, timeline.clientWidth / 75);
   const step = steps.find((each) => view.span / each <= most) || view.span;
-  const ticks = [];
+  byId("times").replaceChildren();
   for (let t = Math.ceil(view.from / step) * step; t <= view.from + view.span; t += step) {
     const label = element("span", step < 1000 ? clock(t) : clock(t).slice(0, -2));
-    label.style.left = `clamp(18px, ${100 * (t - view.from) / view.span}%, 100% - 18px)`;  // 18: half a label's width
-    ticks.push(label);
+    const edge = 4 * label.textContent.length;  // half a label's width in pixels
+    label.style.left = `clamp(${edge}px, ${100 * (t - view.from) / view.span}%, 100% - ${edge}px)`;
+    byId("times").append(label);
   }
-  byId("times").replaceChildren(...ticks);
 }
 
 // ---- The picture as a file. It shows the visible part of the song. Sizes are in pixels and
@@ -60,7 +60,7 @@ function drawTicks() {
 function pictureSvg() {
   const width = 1200, height = 360, top = 34, bottom = 330;
   const ink = getComputedStyle(document.body);
-  const x = (ms) => (width * (ms - view.from) / view.span).toFixed(1);
+  const x = (ms) => Math.min(Math.max(width * (ms - view.from) / view.span, -1e6), 1e6).toFixed(1);  // some programs draw at most 8e6
   const y = (percent) => (top + (bottom - top) * percent / 100).toFixed(1);
   const root = shape("svg", { xmlns: svg.namespaceURI, width, height, viewBox: `0 0 ${width} ${height}`,
     "font-family": "sans-serif", "font-size": 14, fill: ink.color });
@@ -191,13 +191,13 @@ async function togglePlay() {
     dropClicks();
   } else {
     try {
-      context ??= new AudioContext();
-      await context.resume();
+      context ??= window.AudioContext && new AudioContext();
+      context?.resume();
       if (player.now() >= songEnd - 50) player.seek(0);
       dropClicks();
       await player.play();
     } catch (error) {
-      say(song.embedded ? "This browser cannot decode the song." : `The song could not be played from ${decodeURIComponent(song.audio)}.`);
+      if (error.name !== "AbortError" && !audio.error) say("This browser cannot play the song.");  // AbortError: paused
     }
   }
   update();
@@ -218,7 +218,7 @@ function update() {
     if (ended) player.play();
     return;
   }
-  if (playing && pressed("clicks")) addClicks(now);
+  if (playing && pressed("clicks") && context?.state === "running") addClicks(now);
   const isOutside = now < view.from || now > view.from + view.span;
   if (playing && pressed("follow") && isOutside) show(now - view.span / 10, view.span);
   playhead.setAttribute("points", `${now},0 ${now},100`);
@@ -231,7 +231,7 @@ function update() {
     timeline.ariaValueText = clock(now);
   }
 }
-setInterval(update, 40);
+setInterval(() => { if (player.playing() || pressed("play")) update(); }, 40);
 
 // ---- Controls.
 
@@ -289,7 +289,7 @@ timeline.addEventListener("wheel", (event) => {
   else show(view.from + event.deltaX * view.span / 1000, view.span);
 });
 addEventListener("resize", drawTicks);
-audio.addEventListener("error", () => say(`The song was not found at ${decodeURIComponent(song.audio)}: play it beside this page, or make the page with --embed.`));
+audio.addEventListener("error", () => say(`The song was not found at ${new URLSearchParams("=" + song.audio).get("")}, or this browser cannot play it. A page made with --embed contains its song.`));
 
 async function copy(words) {
   const isCopied = await navigator.clipboard?.writeText(words).then(() => true, () => false);
@@ -326,7 +326,7 @@ for (const id of ["clicks", "prev", "next", "tobeat"]) byId(id).disabled = beats
 byId("loudname").hidden = song.loudness.length === 0;
 byId("beatname").hidden = byId("beatlist").hidden = beats.length === 0;
 byId("unsearched").hidden = !song.searched_ms;
-byId("beattimes").append(...beats.map(timeButton));
+for (const beat of beats) byId("beattimes").append(timeButton(beat));
 if (song.note) say(song.note);
 show(0, songEnd);
 update();
