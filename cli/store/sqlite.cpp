@@ -46,7 +46,7 @@ failure run(const database &db, const std::string &sql, const row &values,
         if (code != SQLITE_ROW || !on_row) continue;
         row found;
         for (int i = 0; i < sqlite3_column_count(statement); ++i) {
-            const bool is_path = sqlite3_column_type(statement, i) == SQLITE_BLOB;
+            const bool is_path = sqlite3_column_type(statement, i) == SQLITE_BLOB;  // not UTF-8
             const auto *bytes = static_cast<const char *>(
                 is_path ? sqlite3_column_blob(statement, i) : sqlite3_column_text(statement, i));
             const auto size = static_cast<size_t>(sqlite3_column_bytes(statement, i));
